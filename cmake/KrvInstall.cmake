@@ -1,0 +1,36 @@
+# What `cmake --install` lays out beside the plug-ins, which krv_add_format_plugin installs. The tree may be moved as a
+# whole: nothing in it names the place where it was made.
+include(CMakePackageConfigHelpers)
+set(KRV_PACKAGE_DIR lib/cmake/krvdatasources)
+
+get_property(libraries GLOBAL PROPERTY KRV_LIBRARIES)
+install(TARGETS ${libraries} EXPORT krvdatasourcesTargets LIBRARY DESTINATION lib)
+install(EXPORT krvdatasourcesTargets NAMESPACE krv:: DESTINATION ${KRV_PACKAGE_DIR})
+
+# The shared base of format plug-ins is linked into each of them, so its authors need it as a library.
+set_target_properties(krvpluginsupport PROPERTIES EXPORT_NAME pluginsupport)
+install(TARGETS krvpluginsupport EXPORT krvpluginsupportTargets ARCHIVE DESTINATION lib)
+install(EXPORT krvpluginsupportTargets NAMESPACE krv:: DESTINATION ${KRV_PACKAGE_DIR})
+
+foreach(folder toolkit gobs datasources plugins/support)
+  install(DIRECTORY ${CMAKE_SOURCE_DIR}/${folder}/ DESTINATION include/krv/${folder}
+          FILES_MATCHING PATTERN "*.h" PATTERN detail EXCLUDE)
+endforeach()
+
+configure_package_config_file(${CMAKE_CURRENT_LIST_DIR}/krvdatasourcesConfig.cmake.in
+                              ${CMAKE_BINARY_DIR}/package/krvdatasourcesConfig.cmake
+                              INSTALL_DESTINATION ${KRV_PACKAGE_DIR} NO_SET_AND_CHECK_MACRO)
+write_basic_package_version_file(${CMAKE_BINARY_DIR}/package/krvdatasourcesConfigVersion.cmake
+                                 COMPATIBILITY SameMinorVersion)
+install(FILES ${CMAKE_BINARY_DIR}/package/krvdatasourcesConfig.cmake
+              ${CMAKE_BINARY_DIR}/package/krvdatasourcesConfigVersion.cmake
+              ${CMAKE_CURRENT_LIST_DIR}/KrvPlugin.cmake
+        DESTINATION ${KRV_PACKAGE_DIR})
+
+configure_file(${CMAKE_CURRENT_LIST_DIR}/krvdatasources.pc.in ${CMAKE_BINARY_DIR}/package/krvdatasources.pc @ONLY)
+install(FILES ${CMAKE_BINARY_DIR}/package/krvdatasources.pc DESTINATION lib/pkgconfig)
+
+# For authors of format plug-ins: the conformance checks and the worked example.
+include(${CMAKE_SOURCE_DIR}/tests/conformance/kit/install.cmake OPTIONAL)
+install(FILES ${CMAKE_SOURCE_DIR}/examples/formatplugin/CMakeLists.txt DESTINATION share/krv/formatplugin)
+install(DIRECTORY ${CMAKE_SOURCE_DIR}/plugins/demo DESTINATION share/krv/formatplugin/plugins)

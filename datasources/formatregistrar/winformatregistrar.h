@@ -1,0 +1,35 @@
+#pragma once
+
+#include "datasources/api.h"
+
+#include <string>
+
+namespace krv::datasources
+{
+
+class DatasetManager;
+
+// Loads the format libraries. The name of the file stems from the toolkit's first platform and stays: it is the source
+// file that exceptions report.
+
+// The installation folder: the environment variable KRVHOME or, when that is unset or empty, the first folder above
+// libkrvdatasources itself that holds a registry.
+KRV_DATASOURCES_API std::string GetFormatHome();
+
+// The registry's path below the folder "etc" of the home.
+KRV_DATASOURCES_API std::string GetFormatRegistryFilename();
+
+// base + "." + extension
+KRV_DATASOURCES_API std::string GetFormatLibraryFilename(const std::string& base, const std::string& extension);
+
+// Reads the registry and registers the library of every format that it lists with the manager. The first failure ends
+// it and passes to the caller. Throws DataException when the registry lists nothing; a registry or description that is
+// missing or malformed throws the XML library's own exception.
+void RegisterFormatLibraries(DatasetManager* poManager);
+
+// Loads one library, checks its version and registers its builder. A library stays loaded until the process ends,
+// except one that lacks an entry point. libraryFile: a path, or a name that is looked for in lib/qrfformats of the home
+// and then on the system's search path.
+void RegisterLibrary(const std::string& libraryFile, const std::string& xmlPath, DatasetManager* poManager);
+
+} // namespace krv::datasources

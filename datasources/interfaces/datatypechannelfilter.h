@@ -1,0 +1,26 @@
+#pragma once
+
+#include "datasources/interfaces/ichannelfilter.h"
+#include "gobs/raster/datatype.h"
+
+namespace krv::datasources
+{
+
+// Accepts the channels of exactly one data type, all six fields compared.
+class KRV_DATASOURCES_API DataTypeChannelFilter : public IChannelFilter
+{
+public:
+    explicit DataTypeChannelFilter(const krv::gobs::DataType& oType);
+    DataTypeChannelFilter(const DataTypeChannelFilter&);
+    DataTypeChannelFilter& operator=(const DataTypeChannelFilter&);
+    ~DataTypeChannelFilter() override;
+
+    // Asks the virtual one-channel form, so that a derived filter's rule applies.
+    std::vector<unsigned int> Accept(const IRasterDataset& oDataset) const override;
+    bool Accept(const IRasterDataset& oDataset, unsigned int nChannel) const override;
+
+private:
+    krv::gobs::DataType moType;
+};
+
+} // namespace krv::datasources

@@ -1,0 +1,38 @@
+#pragma once
+
+#include "datasources/api.h"
+#include "datasources/interfaces/metadatamap.h"
+
+#include <string>
+#include <vector>
+
+namespace krv::datasources
+{
+
+class IOverviewManager;
+class IRasterIO;
+
+// The bitmaps (masks) of a dataset, of the image's size, each with a number from 1 that it keeps. Bits are handed out
+// and taken as they are stored, one byte per pixel: reading gives 0 or 1, writing takes any byte but 0 as set. The
+// order of the virtual operations is public and fixed.
+class KRV_DATASOURCES_API IBitmapDataset
+{
+public:
+    virtual ~IBitmapDataset();
+
+    // The numbers of the existing bitmaps, ascending.
+    virtual std::vector<unsigned int> GetBitmapList() const = 0;
+    // A new 8-bit unsigned I/O object over the listed bitmaps, owned by the caller.
+    virtual IRasterIO* GetBitmapIO(const std::vector<unsigned int>& oBitmaps) = 0;
+    virtual void DeleteBitmap(unsigned int nBitmap) = 0;
+    // Adds a bitmap, all clear, and returns its number.
+    virtual unsigned int CreateBitmap() = 0;
+    virtual std::string GetBitmapDescription(unsigned int nBitmap) const = 0;
+    virtual void SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription) = 0;
+    virtual MetadataMap GetBitmapMetadata(unsigned int nBitmap) const = 0;
+    virtual void SetBitmapMetadata(unsigned int nBitmap, const MetadataMap& oMetadata) = 0;
+    // The levels of the bitmaps, with bitmap numbers for channels; a new object that the caller deletes, or null.
+    virtual IOverviewManager* GetBitmapOverviewManager() = 0;
+};
+
+} // namespace krv::datasources

@@ -1,0 +1,46 @@
+#pragma once
+
+#include "datasources/api.h"
+
+#include <string>
+#include <vector>
+
+namespace krv::datasources
+{
+
+// What a format is called. The order of the virtual operations is public and fixed.
+class KRV_DATASOURCES_API IFileFormat
+{
+public:
+    virtual ~IFileFormat();
+
+    // A name for people, such as "GeoTIFF".
+    virtual std::string GetDescription() const = 0;
+    // File name endings without the dot.
+    virtual std::vector<std::string> GetExtensions() const = 0;
+    // The name by which the manager knows the format. Upper case: GetFormatByName finds no other.
+    virtual std::string GetShortName() const = 0;
+};
+
+// Keeps extensions and short name for a concrete format.
+class KRV_DATASOURCES_API ABSFileFormat : public IFileFormat
+{
+public:
+    ABSFileFormat(const ABSFileFormat& oOther);
+    ~ABSFileFormat() override;
+    ABSFileFormat& operator=(const ABSFileFormat& oOther);
+    void Assignment(const ABSFileFormat& oOther);
+
+    std::vector<std::string> GetExtensions() const override;
+    std::string GetShortName() const override;
+
+protected:
+    ABSFileFormat();
+    ABSFileFormat(const std::vector<std::string>& oExtensions, std::string shortName);
+
+private:
+    std::vector<std::string> moExtensions;
+    std::string moShortName;
+};
+
+} // namespace krv::datasources

@@ -1,0 +1,24 @@
+#pragma once
+
+#include "datasources/api.h"
+
+namespace krv::ogc::cs
+{
+class GeocodingInfo;
+}
+
+namespace krv::datasources
+{
+
+// The affine georeferencing of a dataset. The order of the virtual operations is public and fixed.
+class KRV_DATASOURCES_API IGeocodedDataset
+{
+public:
+    virtual ~IGeocodedDataset();
+
+    // From continuous pixel coordinates, (0, 0) the outer corner of the first pixel, to the map; owned by the dataset.
+    virtual const krv::ogc::cs::GeocodingInfo& GetGeocoding() const = 0;
+    virtual void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) = 0;
+};
+
+} // namespace krv::datasources

@@ -1,0 +1,37 @@
+// The destructors of the pure interfaces: one home each, so that every library shares one type-info per class.
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/ichannelfilter.h"
+#include "datasources/interfaces/ichannelinfo.h"
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/iephemerisdataset.h"
+#include "datasources/interfaces/ifileformat.h"
+#include "datasources/interfaces/ifileiobuilder.h"
+#include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/ihistoryio.h"
+#include "datasources/interfaces/imathmodeldataset.h"
+#include "datasources/interfaces/ioverviewio.h"
+#include "datasources/interfaces/ioverviewmanager.h"
+#include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/irasterio.h"
+
+namespace krv::datasources
+{
+
+IBitmapDataset::~IBitmapDataset() = default;
+IChannelFilter::~IChannelFilter() = default;
+IChannelInfo::~IChannelInfo() = default;
+IDataset::~IDataset() = default;
+IEphemerisDataset::~IEphemerisDataset() = default;
+IFileFormat::~IFileFormat() = default;
+IFileIOBuilder::~IFileIOBuilder() = default;
+IGeocodedDataset::~IGeocodedDataset() = default;
+IHistoryIO::~IHistoryIO() = default;
+IMathModelDataset::~IMathModelDataset() = default;
+IOverviewIO::~IOverviewIO() = default;
+IOverviewManager::~IOverviewManager() = default;
+IPCTDataset::~IPCTDataset() = default;
+IRasterDataset::~IRasterDataset() = default;
+IRasterIO::~IRasterIO() = default;
+
+} // namespace krv::datasources

@@ -1,0 +1,19 @@
+#pragma once
+
+#include "datasources/interfaces/irasterio.h"
+
+namespace krv::datasources
+{
+
+// The I/O of one overview level: GetFileWidth and GetFileHeight are the level's size. Readers and writers recognise by
+// this type that they already stand on a level.
+class KRV_DATASOURCES_API IOverviewIO : public IRasterIO
+{
+public:
+    ~IOverviewIO() override;
+
+    // The level's reduction factor.
+    virtual unsigned int GetLevel() const = 0;
+};
+
+} // namespace krv::datasources

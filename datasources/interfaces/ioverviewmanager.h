@@ -1,0 +1,43 @@
+#pragma once
+
+#include "datasources/api.h"
+
+#include <string>
+#include <vector>
+
+namespace krv::datasources
+{
+
+class AuxiliaryData;
+class IRasterIO;
+
+// The overviews (reduced-resolution levels) of a raster dataset. A level's number is its reduction factor: 2, 4, 8.
+// Channels are the file's, from 1. Managers are used while their dataset lives but may be destroyed after it: a
+// destructor touches no dataset. The order of the virtual operations is public and fixed.
+class KRV_DATASOURCES_API IOverviewManager
+{
+public:
+    virtual ~IOverviewManager();
+
+    // The existing levels, ascending; empty when there are none.
+    virtual std::vector<unsigned int> GetLevels() const = 0;
+    // A new IOverviewIO over the channels at a level, owned by the caller. Throws DataException for an unknown level.
+    virtual IRasterIO* GetOverviewIO(unsigned int nLevel, const std::vector<unsigned int>& oChannels) = 0;
+    // Lays out a level for all channels, not valid yet.
+    virtual void CreateLevel(unsigned int nLevel) = 0;
+    // Whether a channel has the level and its pixels are up to date.
+    virtual bool IsValid(unsigned int nChannel, unsigned int nLevel) const = 0;
+    virtual void DeleteLevel(unsigned int nLevel) = 0;
+    // The method by which levels were or will be made; empty when unknown.
+    virtual std::string GetResamplingName() const = 0;
+    virtual void SetValid(unsigned int nChannel, unsigned int nLevel, bool bValid) = 0;
+    // Size of a level in pixels. Throw DataException for an unknown level.
+    virtual unsigned int GetLevelWidth(unsigned int nLevel) const = 0;
+    virtual unsigned int GetLevelHeight(unsigned int nLevel) const = 0;
+    // The level's metadata, with as many channels as the file.
+    virtual AuxiliaryData GetAuxiliaryData(unsigned int nLevel) = 0;
+    // NEAREST, AVERAGE, MODE, BILINEAR, CUBIC, LANCZOS, RMS, MIN, MAX or NONE, in any letter case.
+    virtual void SetResamplingName(const std::string& oName) = 0;
+};
+
+} // namespace krv::datasources

@@ -1,0 +1,36 @@
+#pragma once
+
+#include "datasources/api.h"
+
+#include <string>
+#include <vector>
+
+namespace krv::gobs
+{
+class PCT;
+}
+
+namespace krv::datasources
+{
+
+// The pseudocolour tables of a dataset, each with a number from 1. The order of the virtual operations is public and
+// fixed.
+class KRV_DATASOURCES_API IPCTDataset
+{
+public:
+    virtual ~IPCTDataset();
+
+    virtual std::vector<unsigned int> GetPCTList() const = 0;
+    // A new table owned by the caller. Throws DataException for a number that is not in the list.
+    virtual krv::gobs::PCT* GetPCT(unsigned int nPCT) const = 0;
+    // The channel that the table belongs to by the format's own rules, or 0.
+    virtual unsigned int GetPCTChannel(unsigned int nPCT) const = 0;
+    virtual std::string GetPCTDescription(unsigned int nPCT) const = 0;
+    // Stores a table for a channel (0: none) and returns its number.
+    virtual unsigned int CreatePCT(const krv::gobs::PCT& oTable, unsigned int nChannel) = 0;
+    virtual void UpdatePCT(unsigned int nPCT, const krv::gobs::PCT& oTable) = 0;
+    virtual void SetPCTDescription(unsigned int nPCT, const std::string& oDescription) = 0;
+    virtual void DeletePCT(unsigned int nPCT) = 0;
+};
+
+} // namespace krv::datasources

@@ -1,0 +1,44 @@
+#pragma once
+
+#include "datasources/api.h"
+
+namespace krv::datasources
+{
+
+// Windowed pixel transfer over a fixed list of channels, all of one data type. Positions count whole pixels from the
+// top left corner. Buffers are pixel interleaved, rows top to bottom, no padding, channels in the order of the list.
+// The order of the virtual operations is public and fixed. One thread at a time.
+class KRV_DATASOURCES_API IRasterIO
+{
+public:
+    virtual ~IRasterIO();
+
+    virtual unsigned int GetFileWidth() const = 0;
+    virtual unsigned int GetFileHeight() const = 0;
+
+    // The block of pixels that the format transfers best; readers take it as their tile.
+    virtual unsigned int GetTileWidth() const = 0;
+    virtual unsigned int GetTileHeight() const = 0;
+
+    // Reads a part of a window whose origin may lie outside the image. The buffer holds nWidth * nHeight pixels; the
+    // part starts at column nPartX and row nPartY of the buffer and is nPartWidth by nPartHeight pixels. What of the
+    // part lies inside the image is read; every other byte of the buffer stays untouched, and what lies outside is no
+    // error. Throws krv::IOException or krv::FileFormatException when the file cannot be read; the part is then
+    // undefined.
+    virtual void ReadWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
+                            unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
+                            unsigned char* pBuffer) = 0;
+
+    // Reads a window that lies inside the image, else krv::DataException, into a buffer of exactly its size.
+    virtual void ReadWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
+                            unsigned char* pBuffer) = 0;
+
+    // The counterparts: they store the part of the buffer that lies inside the image, and the whole window.
+    virtual void WriteWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
+                             unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
+                             unsigned char* const pBuffer) = 0;
+    virtual void WriteWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
+                             unsigned char* const pBuffer) = 0;
+};
+
+} // namespace krv::datasources

@@ -1,0 +1,102 @@
+#include "datasources/iomanager/formatcapabilities.h"
+
+#include "datasources/iomanager/xalanselect.h"
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/debugger.h"
+#include "toolkit/xml/xmldocument.h"
+#include "toolkit/xml/xmlutil.h"
+
+#include <xalanc/PlatformSupport/XSLException.hpp>
+#include <xalanc/XPath/XPathEvaluator.hpp>
+#include <xalanc/XalanDOM/XalanDocument.hpp>
+#include <xalanc/XalanDOM/XalanNode.hpp>
+
+#include <charconv>
+#include <limits>
+
+namespace krv::datasources
+{
+
+namespace
+{
+
+constexpr unsigned long long NO_LIMIT = std::numeric_limits<unsigned long long>::max();
+
+void Report(const std::string& message, std::source_location oLocation = std::source_location::current())
+{
+    if (krv::nspio::Debugger::GetLevel() != 0)
+        krv::nspio::Debugger::Debug(1, "qrframework", message, std::string(krv::SourceFileText(oLocation.file_name())),
+                                    oLocation.line());
+}
+
+// Asks a question of the parsed description; any failure is reported as debug output and answers `oOtherwise`.
+template <typename Answer, typename Question>
+Answer Ask(const std::string& xmlPath, const std::string& xpath, Answer oOtherwise, Question oQuestion)
+{
+    try
+    {
+        const krv::xml::Document oDocument = krv::xml::ParseFile(xmlPath);
+        xalanc::XPathEvaluator oEvaluator;
+        return oQuestion(
+            oEvaluator.selectSingleNode(oDocument.GetSupport(), oDocument.Get(), XmlTranscode(xpath).c_str()));
+    }
+    catch (const xalanc::XSLException& oException)
+    {
+        Report(XmlTranscode(oException.getMessage().c_str()));
+    }
+    catch (const std::exception& oException)
+    {
+        Report(oException.what());
+    }
+    catch (...)
+    {
+        Report("An unknown error occur during the XPath evaluation");
+    }
+    return oOtherwise;
+}
+
+unsigned long long ParseLimit(const std::string& text)
+{
+    unsigned long long nLimit = 0;
+    const char* const pEnd = text.data() + text.size();
+    const auto oResult = std::from_chars(text.data(), pEnd, nLimit);
+    if (oResult.ec != std::errc() || oResult.ptr != pEnd)
+        throw krv::DataException("The limit is not a number: " + text);
+    return nLimit;
+}
+
+} // namespace
+
+FormatCapabilities::FormatCapabilities(const std::string& xmlPath) : moXmlPath(xmlPath) {}
+
+FormatCapabilities::FormatCapabilities(const FormatCapabilities& oOther)
+{
+    Copy(oOther);
+}
+
+FormatCapabilities& FormatCapabilities::operator=(const FormatCapabilities& oOther)
+{
+    Copy(oOther);
+    return *this;
+}
+
+FormatCapabilities::~FormatCapabilities() = default;
+
+void FormatCapabilities::Copy(const FormatCapabilities& oOther)
+{
+    moXmlPath = oOther.moXmlPath;
+}
+
+bool FormatCapabilities::IsSupported(const std::string& xpath) const
+{
+    return Ask(moXmlPath, xpath, false, [](const xalanc::XalanNode* poNode) { return poNode != nullptr; });
+}
+
+unsigned long long FormatCapabilities::GetLimit(const std::string& xpath) const
+{
+    return Ask(moXmlPath, xpath, NO_LIMIT,
+               [](const xalanc::XalanNode* poNode)
+               { return poNode == nullptr ? NO_LIMIT : ParseLimit(GetNodeText(*poNode)); });
+}
+
+} // namespace krv::datasources

@@ -1,0 +1,40 @@
+#pragma once
+
+#include "datasources/api.h"
+
+#include <string>
+
+namespace krv::datasources
+{
+
+class IDataset;
+
+// How a dataset is to be shown, kept in its metadata. Exceptions of the dataset's metadata operations pass. The dataset
+// is borrowed and not null; nothing checks that a channel exists, except that tables belong to existing channels: else
+// OutOfBoundsException "Out of bounds.".
+
+// The default channel of a colour; 0 when there is none, or when its tag does not begin with a number of 32 bits.
+// The tag of grey is "DefaultGray", intended.
+KRV_DATASOURCES_API unsigned int GetDefaultRed(IDataset* poDataset);
+KRV_DATASOURCES_API unsigned int GetDefaultGreen(IDataset* poDataset);
+KRV_DATASOURCES_API unsigned int GetDefaultBlue(IDataset* poDataset);
+KRV_DATASOURCES_API unsigned int GetDefaultGrey(IDataset* poDataset);
+
+KRV_DATASOURCES_API void SetDefaultRed(IDataset* poDataset, unsigned int nChannel);
+KRV_DATASOURCES_API void SetDefaultGreen(IDataset* poDataset, unsigned int nChannel);
+KRV_DATASOURCES_API void SetDefaultBlue(IDataset* poDataset, unsigned int nChannel);
+KRV_DATASOURCES_API void SetDefaultGrey(IDataset* poDataset, unsigned int nChannel);
+
+// The segment that holds a channel's default lookup or pseudocolour table; false when none is named. What
+// ParseRefMetadataTag finds of a malformed tag stays in the results.
+KRV_DATASOURCES_API bool GetDefaultLUT(IDataset* poDataset, unsigned int nChannel, std::string& file,
+                                       std::string& layer, unsigned int& nNumber);
+KRV_DATASOURCES_API bool GetDefaultPCT(IDataset* poDataset, unsigned int nChannel, std::string& file,
+                                       std::string& layer, unsigned int& nNumber);
+
+KRV_DATASOURCES_API void SetDefaultLUT(IDataset* poDataset, unsigned int nChannel, const std::string& file,
+                                       const std::string& layer, unsigned int nNumber);
+KRV_DATASOURCES_API void SetDefaultPCT(IDataset* poDataset, unsigned int nChannel, const std::string& file,
+                                       const std::string& layer, unsigned int nNumber);
+
+} // namespace krv::datasources

@@ -1,0 +1,8 @@
+#include "datasources/metadata/iauxdatatfm.h"
+
+namespace krv::qrfutils
+{
+
+IAuxDataTfm::~IAuxDataTfm() = default;
+
+} // namespace krv::qrfutils

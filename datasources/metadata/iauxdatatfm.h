@@ -1,0 +1,22 @@
+#pragma once
+
+#include "datasources/api.h"
+
+namespace krv::datasources
+{
+class AuxiliaryData;
+}
+
+namespace krv::qrfutils
+{
+
+// Makes a new metadata record from a given one. The order of the virtual operations is public and fixed.
+class KRV_DATASOURCES_API IAuxDataTfm
+{
+public:
+    virtual ~IAuxDataTfm();
+
+    virtual krv::datasources::AuxiliaryData Transform(const krv::datasources::AuxiliaryData& oData) const = 0;
+};
+
+} // namespace krv::qrfutils

@@ -1,0 +1,8 @@
+#include "datasources/metadata/imetadatafilter.h"
+
+namespace krv::qrfutils
+{
+
+IMetadataFilter::~IMetadataFilter() = default;
+
+} // namespace krv::qrfutils

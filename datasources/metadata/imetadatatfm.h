@@ -1,0 +1,18 @@
+#pragma once
+
+#include "datasources/api.h"
+#include "datasources/interfaces/metadatamap.h"
+
+namespace krv::qrfutils
+{
+
+// Makes new metadata tags from given ones. The order of the virtual operations is public and fixed.
+class KRV_DATASOURCES_API IMetaDataTfm
+{
+public:
+    virtual ~IMetaDataTfm();
+
+    virtual krv::datasources::MetadataMap Transform(const krv::datasources::MetadataMap& oMap) const = 0;
+};
+
+} // namespace krv::qrfutils

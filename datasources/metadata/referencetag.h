@@ -1,0 +1,23 @@
+#pragma once
+
+#include "datasources/api.h"
+
+#include <string>
+
+namespace krv::datasources
+{
+
+// Reference tags name a file, "gdb:<file>", or one segment of it, "gdb:<file>/{<layer>:<number>}".
+
+// The tag of the whole file when the layer is empty and the number 0, else that of the segment. The number is written
+// as a signed one: above 2147483647 it appears negative, intended, and is read back as it was.
+KRV_DATASOURCES_API std::string BuildRefMetadataTag(const std::string& file, const std::string& layer,
+                                                    unsigned int nNumber);
+
+// Splits a tag at its last braces; without a pair of braces it names a whole file. False for a text that is no tag, an
+// empty layer or a number that does not fit 32 bits; "-1" is 4294967295. Never throws for a malformed tag.
+// What was found before the flaw stays in the results, intended.
+KRV_DATASOURCES_API bool ParseRefMetadataTag(const std::string& tag, std::string& file, std::string& layer,
+                                             unsigned int& nNumber);
+
+} // namespace krv::datasources

@@ -1,0 +1,65 @@
+#pragma once
+
+#include "datasources/reader/rasteraccess.h"
+#include "toolkit/exceptions/place.h"
+
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace krv::datasources
+{
+
+class IBitmapDataset;
+class IChannelFilter;
+class IChannelInfo;
+class IDataset;
+class IRasterDataset;
+class IRasterIO;
+
+// Serves the selected channels of one dataset as a grid of tiles with margins. All channels have one data type; which
+// lists of channels can be read together is the dataset's to say. Pixels go straight from the format into the raster.
+//
+// Margins are read from the file where a whole side of them lies inside it, and otherwise made from the pixels of the
+// raster by FillRasterMargins: a margin that ends exactly at the right or bottom edge, or lies partly outside, is made
+// as a whole.
+class KRV_DATASOURCES_API BasicReader : public RasterAccess
+{
+public:
+    // All channels of a file. Whatever fails after the file was opened is a DataException with the same message.
+    explicit BasicReader(const std::string& fileName);
+    // The channels of a file, from 1, in this order; an empty list is all of them. Failures pass as they are.
+    BasicReader(const std::string& fileName, const std::vector<unsigned int>& oChannels);
+    // The channels that a filter accepts.
+    BasicReader(const std::string& fileName, const IChannelFilter& oFilter);
+    // Bitmaps as 8-bit channels of 0 and 1; an empty list is all of them. With bTakeOwnership the reader deletes the
+    // dataset; it stays the caller's when the constructor throws.
+    BasicReader(IBitmapDataset* poDataset, const std::vector<unsigned int>& oBitmaps, bool bTakeOwnership);
+    // The channels of an open dataset; ownership as above.
+    BasicReader(IDataset* poDataset, const std::vector<unsigned int>& oChannels, bool bTakeOwnership);
+    // Channels through another I/O than the dataset's own: an overview level. The reader takes the I/O over, also when
+    // the constructor throws; the dataset stays the caller's and outlives the reader.
+    BasicReader(IRasterDataset* poRasterDataset, IRasterIO* poRasterIO, const std::vector<unsigned int>& oChannels);
+
+    ~BasicReader() override;
+
+    krv::gobs::Raster* GetRaster(unsigned int nIndex) override;
+    void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour) override;
+    void ReadRaster(krv::gobs::Raster* poRaster) override;
+    krv::gobs::Raster* ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight) override;
+    IOverviewReaderAccessor* GetOverviewReaderAccessor() override;
+
+protected:
+    // For derived readers, which set up their own state.
+    BasicReader();
+
+    // Makes the margins of the sides that ReadRaster did not read. Throws DataException under eException.
+    void FillMargins(krv::gobs::Raster* poRaster);
+
+private:
+    void UseChannels(IDataset* poDataset, IRasterDataset& oRasterDataset, std::unique_ptr<IRasterIO> oRasterIO,
+                     const krv::Place& oPlace);
+    void TakeDataset(std::unique_ptr<IDataset> oDataset);
+};
+
+} // namespace krv::datasources

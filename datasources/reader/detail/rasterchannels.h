@@ -1,0 +1,136 @@
+#pragma once
+
+#include "gobs/raster/datatype.h"
+#include "gobs/raster/margins.h"
+#include "gobs/tile/tileiterator.h"
+#include "toolkit/exceptions/place.h"
+
+#include <memory>
+#include <vector>
+
+namespace krv::gobs
+{
+class Raster;
+}
+
+namespace krv::ogc::cs
+{
+class GeocodingInfo;
+}
+
+namespace krv::datasources
+{
+
+class AuxiliaryData;
+class IBitmapDataset;
+class IChannelInfo;
+class IDataset;
+class IRasterDataset;
+class IRasterIO;
+
+namespace detail
+{
+
+// Owns channel descriptions and hands them out as the interfaces want them.
+class ChannelInfos
+{
+public:
+    ChannelInfos() = default;
+    ChannelInfos(ChannelInfos&& oOther) noexcept = default;
+    ChannelInfos& operator=(ChannelInfos&& oOther) noexcept;
+    ~ChannelInfos();
+
+    void Add(std::unique_ptr<IChannelInfo> oInfo);
+    const std::vector<IChannelInfo*>& Get() const { return moInfos; }
+
+private:
+    std::vector<IChannelInfo*> moInfos;
+};
+
+// Everything that becomes known when channels are opened; made as a whole or not at all.
+struct OpenedChannels
+{
+    OpenedChannels();
+    OpenedChannels(OpenedChannels&&) noexcept;
+    OpenedChannels& operator=(OpenedChannels&&) noexcept;
+    ~OpenedChannels();
+
+    std::unique_ptr<IRasterIO> mpoRasterIO;
+    ChannelInfos moInfos;
+    krv::gobs::DataType moType;
+    krv::gobs::TileIterator moTiles{0, 0};
+    unsigned int mnWidth = 0;
+    unsigned int mnHeight = 0;
+    unsigned int mnTileWidth = 0;
+    unsigned int mnTileHeight = 0;
+};
+
+// Opens image channels in the type of the first; a given I/O is used instead of the dataset's own and taken over.
+OpenedChannels OpenChannels(IRasterDataset& oDataset, const std::vector<unsigned int>& oChannels,
+                            std::unique_ptr<IRasterIO> oRasterIO, const Place& oPlace);
+
+// Opens bitmaps as 8-bit unsigned channels.
+OpenedChannels OpenBitmaps(IBitmapDataset& oDataset, const std::vector<unsigned int>& oBitmaps, const Place& oPlace);
+
+// An I/O alone, without descriptions.
+OpenedChannels OpenRasterIO(std::unique_ptr<IRasterIO> oRasterIO, const krv::gobs::DataType& oType,
+                            const Place& oPlace);
+
+// 1, 2, ... the dataset's channel count
+std::vector<unsigned int> AllChannels(const IRasterDataset& oDataset);
+
+// The file metadata of a dataset, and metadata and descriptions of the listed channels in the order of the list.
+AuxiliaryData SelectChannelData(IDataset& oDataset, const std::vector<unsigned int>& oChannels);
+
+// The signed 32-bit number that a raster's position is; throws DataException when it is none.
+int ToPosition(long long nValue, const Place& oPlace);
+
+// What readers and writers have in common: the dataset, the opened channels, the tile grid and the margins.
+class RasterChannels
+{
+public:
+    RasterChannels() = default;
+    RasterChannels(const RasterChannels&) = delete;
+    RasterChannels& operator=(const RasterChannels&) = delete;
+    // Deletes the I/O, then the dataset if it is owned, then the descriptions.
+    ~RasterChannels();
+
+    bool IsOpen() const { return moOpened.mpoRasterIO != nullptr; }
+    void Commit(OpenedChannels oOpened) { moOpened = std::move(oOpened); }
+
+    unsigned int GetTileCount() const { return moOpened.moTiles.GetTileRange() + 1; }
+    void SetTileSize(unsigned int nWidth, unsigned int nHeight);
+    // Does nothing before the channels are open.
+    void SetOptimalTileSize();
+    void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour, const Place& oPlace);
+
+    // An unfilled raster of a tile or window with the current margins.
+    std::unique_ptr<krv::gobs::Raster> MakeTile(unsigned int nIndex, const Place& oPlace) const;
+    std::unique_ptr<krv::gobs::Raster> MakeRaster(unsigned int nX, unsigned int nY, unsigned int nWidth,
+                                                  unsigned int nHeight, const Place& oPlace) const;
+
+    // Fills a raster of the right count and type, margins by its own description. Margins that lie wholly inside the
+    // image are read with it, the others are made afterwards by FillMargins.
+    void Read(krv::gobs::Raster& oRaster, const Place& oPlace);
+    void FillMargins(krv::gobs::Raster& oRaster, const Place& oPlace) const;
+
+    // Stores the centre of a raster of the right count and type.
+    void Write(const krv::gobs::Raster& oRaster, const Place& oPlace);
+
+    // A new object, or null without georeferencing.
+    krv::ogc::cs::GeocodingInfo* GetGeocodingInfo() const;
+    AuxiliaryData GetAuxiliaryData() const;
+
+    IDataset* mpoDataset = nullptr; // deleted only when mbOwnsDataset
+    bool mbOwnsDataset = false;
+    bool mbBitmaps = false;
+    std::vector<unsigned int> moChannels;
+    OpenedChannels moOpened;
+    eMarginBehaviour meMarginBehaviour = eMirror;
+    unsigned int mnXMargin = 0;
+    unsigned int mnYMargin = 0;
+};
+
+} // namespace detail
+
+} // namespace krv::datasources

@@ -1,0 +1,12 @@
+#include "datasources/reader/ioverviewaccessor.h"
+#include "datasources/reader/irasteriterable.h"
+#include "datasources/reader/irasterreader.h"
+
+namespace krv::datasources
+{
+
+IOverviewAccessor::~IOverviewAccessor() = default;
+IOverviewReaderAccessor::~IOverviewReaderAccessor() = default;
+IRasterIterable::~IRasterIterable() = default;
+
+} // namespace krv::datasources

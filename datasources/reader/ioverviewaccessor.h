@@ -1,0 +1,38 @@
+#pragma once
+
+#include "datasources/api.h"
+
+#include <vector>
+
+namespace krv::datasources
+{
+
+class AuxiliaryData;
+class IRasterReader;
+
+// The overview levels of a fixed list of channels. A level's number is its reduction factor (2, 4, 8); a channel is a
+// position in the list, from 1, not a channel number of the file. The order of the virtual operations is fixed.
+class KRV_DATASOURCES_API IOverviewAccessor
+{
+public:
+    virtual ~IOverviewAccessor();
+
+    virtual std::vector<unsigned int> GetLevels() const = 0;
+    virtual bool IsValid(unsigned int nChannel, unsigned int nLevel) const = 0;
+    // Whether every channel of the list has the level.
+    virtual bool IsLevelValid(unsigned int nLevel) const = 0;
+    // The level's file metadata, and the metadata of each channel of the list.
+    virtual AuxiliaryData GetAuxiliaryData(unsigned int nLevel) = 0;
+    virtual unsigned int GetChanCount() const = 0;
+};
+
+class KRV_DATASOURCES_API IOverviewReaderAccessor : public IOverviewAccessor
+{
+public:
+    ~IOverviewReaderAccessor() override;
+
+    // A new reader over a level, owned by the caller; accessor and dataset outlive it.
+    virtual IRasterReader* CreateRasterReader(unsigned int nLevel) = 0;
+};
+
+} // namespace krv::datasources

@@ -1,0 +1,42 @@
+#pragma once
+
+#include "datasources/api.h"
+
+#include <vector>
+
+namespace krv::gobs
+{
+class Raster;
+}
+
+namespace krv::datasources
+{
+
+class IChannelInfo;
+class RasterIterator;
+
+// The tile grid of a reader or writer. A virtual base, so that a class that is both has one grid.
+// The order of the virtual operations is fixed.
+class KRV_DATASOURCES_API IRasterIterable
+{
+public:
+    virtual ~IRasterIterable();
+
+    // A new raster of tile nIndex with the current margins, owned by the caller.
+    virtual krv::gobs::Raster* GetRaster(unsigned int nIndex) = 0;
+    // The tile that holds a pixel; End() for a pixel outside the image.
+    virtual RasterIterator FindRaster(unsigned int nX, unsigned int nY) = 0;
+    virtual RasterIterator Begin() = 0;
+    virtual RasterIterator End() = 0;
+    virtual unsigned int GetTileCount() const = 0;
+    // Takes the format's preferred block as tile.
+    virtual void SetOptimalTileSize() = 0;
+    // In pixels; 0 counts as 1. Indices of existing iterators then mean other tiles.
+    virtual void SetTileSize(unsigned int nWidth, unsigned int nHeight) = 0;
+    virtual unsigned int GetTileWidth() const = 0;
+    virtual unsigned int GetTileHeight() const = 0;
+    // One description per channel, in the order of the channels in rasters; owned by this object.
+    virtual const std::vector<IChannelInfo*>& GetChannelsInfo() const = 0;
+};
+
+} // namespace krv::datasources

@@ -1,0 +1,105 @@
+#pragma once
+
+#include "datasources/reader/irasterreader.h"
+#include "gobs/raster/datatype.h"
+#include "toolkit/exceptions/place.h"
+
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace krv::datasources
+{
+
+class BasicOverviewReaderAccessor;
+class IChannelInfo;
+class IDataset;
+class IRasterDataset;
+
+// Where the channels of one data type go when their places in the channel list have gaps.
+enum eChannelPlacement
+{
+    // Side by side from the first of their places, intended: stored processing chains count on it. Channels of the
+    // result that nothing is placed on are 0.
+    eFromFirstPlace = 0,
+    // Every channel at its own place.
+    eOwnPlace = 1
+};
+
+// Serves channels of different data types as one image of a single type: the promoted type of all channels or a
+// requested one. Channels of one type are read together; each group is converted and placed in the result.
+class KRV_DATASOURCES_API MultiTypeReader : public IRasterReader
+{
+public:
+    // Channels of a file, from 1. An empty list is a DataException here, intended: a mixed file has no natural list.
+    MultiTypeReader(const std::string& fileName, const std::vector<unsigned int>& oChannels,
+                    eChannelPlacement ePlacement = eFromFirstPlace);
+    // The same in a requested type; warns when that type orders before the promoted one.
+    MultiTypeReader(const std::string& fileName, const std::vector<unsigned int>& oChannels,
+                    const krv::gobs::DataType& oType, eChannelPlacement ePlacement = eFromFirstPlace);
+    // Channels of a dataset that stays the caller's and outlives the reader.
+    MultiTypeReader(IDataset* poDataset, const std::vector<unsigned int>& oChannels,
+                    eChannelPlacement ePlacement = eFromFirstPlace);
+    MultiTypeReader(IDataset* poDataset, const std::vector<unsigned int>& oChannels, const krv::gobs::DataType& oType,
+                    eChannelPlacement ePlacement = eFromFirstPlace);
+    // Ready-made readers of one channel each and of one size, reader n for channel n of the result; they are taken
+    // over, also when the constructor throws. The dataset answers for metadata, of the listed channels, and for format,
+    // reference system and geocoding. There are no overviews.
+    MultiTypeReader(IDataset* poDataset, const std::vector<IRasterReader*>& oReaders,
+                    const std::vector<unsigned int>& oChannels);
+    MultiTypeReader(IDataset* poDataset, const std::vector<IRasterReader*>& oReaders,
+                    const std::vector<unsigned int>& oChannels, const krv::gobs::DataType& oType);
+    MultiTypeReader(const MultiTypeReader&) = delete;
+    MultiTypeReader& operator=(const MultiTypeReader&) = delete;
+    ~MultiTypeReader() override;
+
+    krv::gobs::Raster* GetRaster(unsigned int nIndex) override;
+    RasterIterator FindRaster(unsigned int nX, unsigned int nY) override;
+    RasterIterator Begin() override;
+    RasterIterator End() override;
+    unsigned int GetTileCount() const override;
+    // The block of the first group's format, for all groups.
+    void SetOptimalTileSize() override;
+    void SetTileSize(unsigned int nWidth, unsigned int nHeight) override;
+    unsigned int GetTileWidth() const override;
+    unsigned int GetTileHeight() const override;
+    const std::vector<IChannelInfo*>& GetChannelsInfo() const override;
+
+    IFileFormat* GetFileFormat() const override;
+    void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour) override;
+    unsigned int GetXMargin() const override;
+    unsigned int GetYMargin() const override;
+    eMarginBehaviour GetMarginBehaviour() const override;
+    void ReadRaster(krv::gobs::Raster* poRaster) override;
+    krv::gobs::Raster* ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight) override;
+    AuxiliaryData GetAuxiliaryData() const override;
+    krv::ogc::cs::ICRS* GetCRS() const override;
+    krv::ogc::cs::GeocodingInfo* GetGeocodingInfo() const override;
+    IOverviewReaderAccessor* GetOverviewReaderAccessor() override;
+    unsigned int GetWidth() const override;
+    unsigned int GetHeight() const override;
+    unsigned int GetChansCount() const override;
+    const krv::gobs::DataType& GetDataType() const override;
+
+protected:
+    // For derived readers, which set up their own state.
+    MultiTypeReader();
+
+private:
+    friend class MultiTypeOverviewReaderAccessor;
+    struct State;
+
+    void OpenFile(const std::string& fileName, const std::vector<unsigned int>& oChannels, eChannelPlacement ePlacement,
+                  const krv::Place& oPlace);
+    void UseDataset(IDataset* poDataset, const std::vector<unsigned int>& oChannels, eChannelPlacement ePlacement,
+                    const krv::Place& oPlace);
+    void UseReaders(IDataset* poDataset, const std::vector<IRasterReader*>& oReaders,
+                    const std::vector<unsigned int>& oChannels, const krv::Place& oPlace);
+    void Settle();
+    void RequestType(const krv::gobs::DataType& oType, const krv::Place& oPlace);
+    void ReadGroups(krv::gobs::Raster& oRaster);
+
+    std::unique_ptr<State> mpoState;
+};
+
+} // namespace krv::datasources

@@ -1,0 +1,53 @@
+#pragma once
+
+#include "datasources/reader/irasterreader.h"
+
+#include <memory>
+
+namespace krv::datasources
+{
+
+namespace detail
+{
+class RasterChannels;
+}
+
+// The answers that the standard readers and writers give alike: tile grid, margins, size, type and what the dataset
+// says of itself.
+class KRV_DATASOURCES_API RasterAccess : public virtual IRasterReader
+{
+public:
+    RasterAccess(const RasterAccess&) = delete;
+    RasterAccess& operator=(const RasterAccess&) = delete;
+    ~RasterAccess() override;
+
+    RasterIterator FindRaster(unsigned int nX, unsigned int nY) override;
+    RasterIterator Begin() override;
+    RasterIterator End() override;
+    unsigned int GetTileCount() const override;
+    void SetOptimalTileSize() override;
+    void SetTileSize(unsigned int nWidth, unsigned int nHeight) override;
+    unsigned int GetTileWidth() const override;
+    unsigned int GetTileHeight() const override;
+    const std::vector<IChannelInfo*>& GetChannelsInfo() const override;
+
+    IFileFormat* GetFileFormat() const override;
+    unsigned int GetXMargin() const override;
+    unsigned int GetYMargin() const override;
+    eMarginBehaviour GetMarginBehaviour() const override;
+    AuxiliaryData GetAuxiliaryData() const override;
+    krv::ogc::cs::ICRS* GetCRS() const override;
+    krv::ogc::cs::GeocodingInfo* GetGeocodingInfo() const override;
+    unsigned int GetWidth() const override;
+    unsigned int GetHeight() const override;
+    unsigned int GetChansCount() const override;
+    const krv::gobs::DataType& GetDataType() const override;
+
+protected:
+    // No dataset, no channels, no margins, eMirror.
+    RasterAccess();
+
+    std::unique_ptr<detail::RasterChannels> mpoChannels;
+};
+
+} // namespace krv::datasources

@@ -1,0 +1,53 @@
+#pragma once
+
+#include "datasources/reader/irasteriterable.h"
+#include "datasources/reader/rasteriterator.h"
+#include "gobs/raster/raster.h"
+
+#include <cstddef>
+#include <iterator>
+#include <memory>
+
+namespace krv::datasources
+{
+
+// The tiles of a reader or writer for a range loop, each owned by the loop:
+//     for (std::unique_ptr<krv::gobs::Raster> oTile : RasterRange(oReader))
+// Each step reads one tile. The reader outlives the range and keeps its tile size meanwhile.
+class RasterRange
+{
+public:
+    class Iterator
+    {
+    public:
+        using iterator_category = std::input_iterator_tag;
+        using difference_type = std::ptrdiff_t;
+        using value_type = std::unique_ptr<krv::gobs::Raster>;
+        using pointer = void;
+        using reference = value_type;
+
+        explicit Iterator(const RasterIterator& oPosition) : moPosition(oPosition) {}
+
+        value_type operator*() const { return value_type(*moPosition); }
+        Iterator& operator++()
+        {
+            ++moPosition;
+            return *this;
+        }
+        void operator++(int) { ++moPosition; }
+        bool operator==(const Iterator& oOther) const { return moPosition == oOther.moPosition; }
+
+    private:
+        RasterIterator moPosition;
+    };
+
+    explicit RasterRange(IRasterIterable& oIterable) : mpoIterable(&oIterable) {}
+
+    Iterator begin() const { return Iterator(mpoIterable->Begin()); }
+    Iterator end() const { return Iterator(mpoIterable->End()); }
+
+private:
+    IRasterIterable* mpoIterable; // borrowed
+};
+
+} // namespace krv::datasources

@@ -1,0 +1,224 @@
+#include "datasources/reader/validitysource.h"
+
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/metadata/auxiliarydata.h"
+#include "datasources/metadata/typednodata.h"
+#include "datasources/reader/basicreader.h"
+#include "gobs/mask/exactmaskdecision.h"
+#include "gobs/mask/mask.h"
+#include "gobs/raster/raster.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <algorithm>
+#include <numeric>
+
+namespace krv::datasources
+{
+
+namespace
+{
+
+using krv::gobs::BkgdRule;
+using krv::gobs::ExactMaskDecision;
+using krv::gobs::IMaskBuilder;
+using krv::gobs::Mask;
+using krv::gobs::MaskDecisionBuilder;
+using krv::gobs::Raster;
+
+IRasterDataset& RequireRaster(IDataset* poDataset, const Place& oPlace)
+{
+    if (poDataset == nullptr)
+        throw krv::DataException("The dataset is NULL", oPlace);
+    auto* const poRasterDataset = dynamic_cast<IRasterDataset*>(poDataset);
+    if (poRasterDataset == nullptr)
+        throw krv::DataException("This dataset doesn't support Raster.", oPlace);
+    return *poRasterDataset;
+}
+
+std::vector<unsigned int> FirstChannels(unsigned int nCount)
+{
+    std::vector<unsigned int> oChannels(nCount);
+    std::iota(oChannels.begin(), oChannels.end(), 1u);
+    return oChannels;
+}
+
+// The first channel that is described as alpha, or 0.
+unsigned int FindAlpha(const AuxiliaryData& oMetadata)
+{
+    const detail::CaseInsensitiveCompare oLess;
+    for (unsigned int nChannel = 1; nChannel <= oMetadata.GetChannelCount(); ++nChannel)
+    {
+        const std::string meaning = oMetadata.GetChanMetadataValue("ColorInterp", nChannel);
+        if (!oLess(meaning, "alpha") && !oLess("alpha", meaning))
+            return nChannel;
+    }
+    return 0;
+}
+
+std::unique_ptr<const IMaskBuilder> ZeroOrNaN(unsigned int nChannel)
+{
+    const ExactMaskDecision oDecision(krv::gobs::eAnyChannel, {NoDataValue::FromUnsigned(0)}, {nChannel}, true);
+    return std::make_unique<MaskDecisionBuilder>(&oDecision);
+}
+
+// Marks what an extra channel over the region of the raster says to be background.
+std::unique_ptr<Mask> ReadBackground(BasicReader& oReader, const Raster& oRegion)
+{
+    const krv::gobs::RasterInfo oInfo(oRegion.GetWidth(), oRegion.GetHeight(), 1, oReader.GetDataType());
+    Raster oRaster(oInfo, oRegion.GetContext());
+    oReader.ReadRaster(&oRaster);
+    return std::unique_ptr<Mask>(ZeroOrNaN(1)->BuildMask(oRaster));
+}
+
+void Add(Mask& oBackground, const Mask& oOther)
+{
+    unsigned char* const pBits = oBackground.GetBits();
+    const unsigned char* const pOther = oOther.GetBits();
+    for (std::uint64_t n = 0; n < oBackground.GetBitsSize(); ++n)
+        pBits[n] |= pOther[n];
+}
+
+void AddOutside(Mask& oBackground, unsigned int nImageWidth, unsigned int nImageHeight)
+{
+    const std::int64_t nLeft = std::int64_t{oBackground.GetX()} - oBackground.GetXMargin();
+    const std::int64_t nTop = std::int64_t{oBackground.GetY()} - oBackground.GetYMargin();
+    for (std::uint64_t nRow = 0; nRow < oBackground.GetFullHeight(); ++nRow)
+    {
+        const std::int64_t nY = nTop + static_cast<std::int64_t>(nRow);
+        const bool bRowInside = nY >= 0 && nY < nImageHeight;
+        for (std::uint64_t nColumn = 0; nColumn < oBackground.GetFullWidth(); ++nColumn)
+        {
+            const std::int64_t nX = nLeft + static_cast<std::int64_t>(nColumn);
+            if (!bRowInside || nX < 0 || nX >= nImageWidth)
+                oBackground.SetBit(nColumn, nRow);
+        }
+    }
+}
+
+bool ReachesOutside(const Mask& oMask, unsigned int nImageWidth, unsigned int nImageHeight)
+{
+    const std::int64_t nLeft = std::int64_t{oMask.GetX()} - oMask.GetXMargin();
+    const std::int64_t nTop = std::int64_t{oMask.GetY()} - oMask.GetYMargin();
+    return nLeft < 0 || nTop < 0 || nLeft + static_cast<std::int64_t>(oMask.GetFullWidth()) > nImageWidth ||
+           nTop + static_cast<std::int64_t>(oMask.GetFullHeight()) > nImageHeight;
+}
+
+bool CopiesPixels(eMarginBehaviour eBehaviour)
+{
+    return eBehaviour == eReplicate || eBehaviour == eMirror || eBehaviour == eMirror101 || eBehaviour == eWrap;
+}
+
+// Spare bits of the last byte stay clear.
+void Invert(Mask& oMask)
+{
+    unsigned char* const pBits = oMask.GetBits();
+    const std::uint64_t nSize = oMask.GetBitsSize();
+    for (std::uint64_t n = 0; n < nSize; ++n)
+        pBits[n] = static_cast<unsigned char>(~pBits[n]);
+    const std::uint64_t nSpare = nSize * 8 - oMask.GetFullWidth() * oMask.GetFullHeight();
+    if (nSize > 0)
+        pBits[nSize - 1] &= static_cast<unsigned char>(0xFFu << nSpare);
+}
+
+} // namespace
+
+ValiditySource::ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels, BkgdRule eRule)
+{
+    IRasterDataset& oRasterDataset = RequireRaster(poDataset, Place::Current());
+    mnImageWidth = oRasterDataset.GetWidth();
+    mnImageHeight = oRasterDataset.GetHeight();
+    const AuxiliaryData oMetadata = poDataset->ReadAuxiliaryData();
+    const std::vector<unsigned int> oListed =
+        oChannels.empty() ? FirstChannels(oMetadata.GetChannelCount()) : oChannels;
+    const unsigned int nAlpha = FindAlpha(oMetadata);
+    FindNoData(oMetadata, oListed, nAlpha, eRule);
+    FindBitmap(*poDataset);
+    const auto oAlpha = std::find(oListed.begin(), oListed.end(), nAlpha);
+    if (nAlpha != 0 && oAlpha != oListed.end())
+        UseAlphaOfRaster(static_cast<unsigned int>(oAlpha - oListed.begin()) + 1);
+    else if (nAlpha != 0)
+        mpoAlphaReader = std::make_unique<BasicReader>(poDataset, std::vector<unsigned int>{nAlpha}, false);
+}
+
+ValiditySource::ValiditySource(const IRasterReader& oReader, BkgdRule eRule)
+    : mnImageWidth(oReader.GetWidth()), mnImageHeight(oReader.GetHeight())
+{
+    const AuxiliaryData oMetadata = oReader.GetAuxiliaryData();
+    const unsigned int nAlpha = FindAlpha(oMetadata);
+    FindNoData(oMetadata, FirstChannels(oMetadata.GetChannelCount()), nAlpha, eRule);
+    if (nAlpha != 0)
+        UseAlphaOfRaster(nAlpha);
+    SetMarginBehaviour(oReader.GetMarginBehaviour());
+}
+
+ValiditySource::~ValiditySource() = default;
+
+void ValiditySource::FindNoData(const AuxiliaryData& oMetadata, const std::vector<unsigned int>& oChannels,
+                                unsigned int nAlpha, BkgdRule eRule)
+{
+    std::vector<unsigned int> oPositions;
+    std::vector<NoDataValue> oValues;
+    for (std::size_t n = 0; n < oChannels.size(); ++n)
+    {
+        const auto oValue = GetTypedNoData(oMetadata, oChannels[n]);
+        if (!oValue || oChannels[n] == nAlpha)
+            continue;
+        oPositions.push_back(static_cast<unsigned int>(n) + 1);
+        oValues.push_back(*oValue);
+    }
+    mbNoData = !oValues.empty();
+    const ExactMaskDecision oDecision(eRule, oValues, oPositions);
+    mpoNoData = std::make_unique<MaskDecisionBuilder>(&oDecision);
+}
+
+void ValiditySource::FindBitmap(IDataset& oDataset)
+{
+    auto* const poBitmaps = dynamic_cast<IBitmapDataset*>(&oDataset);
+    if (poBitmaps == nullptr)
+        return;
+    for (const unsigned int nBitmap : poBitmaps->GetBitmapList())
+    {
+        if (!poBitmaps->GetBitmapDescription(nBitmap).empty())
+            continue;
+        mpoBitmapReader = std::make_unique<BasicReader>(poBitmaps, std::vector<unsigned int>{nBitmap}, false);
+        return;
+    }
+}
+
+void ValiditySource::UseAlphaOfRaster(unsigned int nPosition)
+{
+    mnAlphaInRaster = nPosition;
+    mpoAlphaOfRaster = ZeroOrNaN(nPosition);
+}
+
+void ValiditySource::SetMarginBehaviour(eMarginBehaviour eBehaviour)
+{
+    meBehaviour = eBehaviour;
+    // What is read beside the raster is not valid outside the image when the raster's margins are not copies.
+    const eMarginBehaviour eRead = CopiesPixels(eBehaviour) ? eBehaviour : eConstant;
+    for (BasicReader* poReader : {mpoBitmapReader.get(), mpoAlphaReader.get()})
+    {
+        if (poReader != nullptr)
+            poReader->SetMargins(0, 0, eRead);
+    }
+}
+
+Mask* ValiditySource::BuildMask(const Raster& oRaster) const
+{
+    std::unique_ptr<Mask> oMask(mpoNoData->BuildMask(oRaster));
+    if (mpoAlphaOfRaster != nullptr)
+        Add(*oMask, *std::unique_ptr<Mask>(mpoAlphaOfRaster->BuildMask(oRaster)));
+    for (BasicReader* poReader : {mpoBitmapReader.get(), mpoAlphaReader.get()})
+    {
+        if (poReader != nullptr)
+            Add(*oMask, *ReadBackground(*poReader, oRaster));
+    }
+    if (!CopiesPixels(meBehaviour) && ReachesOutside(*oMask, mnImageWidth, mnImageHeight))
+        AddOutside(*oMask, mnImageWidth, mnImageHeight);
+    Invert(*oMask);
+    return oMask.release();
+}
+
+} // namespace krv::datasources

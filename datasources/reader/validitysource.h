@@ -1,0 +1,72 @@
+#pragma once
+
+#include "datasources/api.h"
+#include "gobs/mask/imaskbuilder.h"
+#include "gobs/mask/maskdecision.h"
+#include "gobs/raster/margins.h"
+
+#include <memory>
+#include <vector>
+
+namespace krv::datasources
+{
+
+class AuxiliaryData;
+class BasicReader;
+class IDataset;
+class IRasterReader;
+
+// Which pixels of an image hold data, by everything that the image declares at once: no-data values, a mask bitmap and
+// an alpha channel. A pixel is valid when none of them says otherwise and it lies inside the image; unlike the masks of
+// no-data builders a set bit is a valid pixel.
+//
+// No-data: the values of the channels, alpha aside, as GetTypedNoData reads them, combined by the rule. Mask bitmap:
+// the first bitmap without a description; its set bits are valid. Alpha: the first channel whose tag "ColorInterp" is
+// "Alpha", in any letter case; values above 0 are valid. One thread at a time.
+class KRV_DATASOURCES_API ValiditySource : public krv::gobs::IMaskBuilder
+{
+public:
+    // For rasters of the listed channels of the dataset (from 1, in the order of the rasters; none: all). The dataset
+    // is borrowed and outlives this. Bitmap and alpha are read from it, with each mask. Throws DataException for a null
+    // dataset, one without rasters and a text that is no no-data value, OutOfBoundsException for a channel that does
+    // not exist.
+    explicit ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels = {},
+                            krv::gobs::BkgdRule eRule = krv::gobs::eAllChannels);
+    // For rasters of the reader, a level's too: by what its metadata and its channels say. There is no bitmap, and
+    // alpha counts only when it is one of the reader's channels. The reader may go away.
+    explicit ValiditySource(const IRasterReader& oReader, krv::gobs::BkgdRule eRule = krv::gobs::eAllChannels);
+    ~ValiditySource() override;
+    ValiditySource(const ValiditySource&) = delete;
+    ValiditySource& operator=(const ValiditySource&) = delete;
+
+    // Which sources there are; with none of them every pixel of the image is valid.
+    bool HasNoData() const { return mbNoData; }
+    bool HasBitmap() const { return mpoBitmapReader != nullptr; }
+    bool HasAlpha() const { return mpoAlphaReader != nullptr || mnAlphaInRaster != 0; }
+
+    // How the margins of the rasters were made; eMirror when nobody says. Behaviours that copy pixels copy their
+    // validity; under the others pixels outside the image are not valid.
+    void SetMarginBehaviour(eMarginBehaviour eBehaviour);
+
+    // A new mask over the raster's full extent, owned by the caller. Throws what reading bitmap and alpha throws.
+    krv::gobs::Mask* BuildMask(const krv::gobs::Raster& oRaster) const override;
+
+private:
+    void FindNoData(const AuxiliaryData& oMetadata, const std::vector<unsigned int>& oChannels, unsigned int nAlpha,
+                    krv::gobs::BkgdRule eRule);
+    void FindBitmap(IDataset& oDataset);
+    void UseAlphaOfRaster(unsigned int nPosition);
+
+    std::unique_ptr<const krv::gobs::IMaskBuilder> mpoNoData;
+    std::unique_ptr<const krv::gobs::IMaskBuilder> mpoAlphaOfRaster;
+    // What they read is background where it is 0.
+    std::unique_ptr<BasicReader> mpoBitmapReader;
+    std::unique_ptr<BasicReader> mpoAlphaReader;
+    unsigned int mnImageWidth;
+    unsigned int mnImageHeight;
+    unsigned int mnAlphaInRaster = 0; // from 1
+    bool mbNoData = false;
+    eMarginBehaviour meBehaviour = eMirror;
+};
+
+} // namespace krv::datasources

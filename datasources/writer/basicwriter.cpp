@@ -1,0 +1,371 @@
+#include "datasources/writer/basicwriter.h"
+
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/ichannelfilter.h"
+#include "datasources/interfaces/ichannelinfo.h"
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/ifileformat.h"
+#include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/ioverviewio.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "datasources/metadata/auxiliarydata.h"
+#include "datasources/reader/basicoverviewreaderaccessor.h"
+#include "datasources/reader/checkrastercompatible.h"
+#include "datasources/reader/detail/rasterchannels.h"
+#include "datasources/writer/basicoverviewwriteraccessor.h"
+#include "gobs/raster/raster.h"
+#include "toolkit/core/core.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <numeric>
+#include <utility>
+
+namespace krv::datasources
+{
+
+namespace
+{
+
+std::string FormatName(const IDataset& oDataset)
+{
+    const IFileFormat* const poFormat = oDataset.GetFileFormat();
+    return poFormat != nullptr ? poFormat->GetShortName() : std::string();
+}
+
+template <typename Facet>
+Facet& RequireFacet(IDataset* poDataset, const std::string& message, const Place& oPlace)
+{
+    auto* const poFacet = dynamic_cast<Facet*>(poDataset);
+    if (poFacet == nullptr)
+        throw krv::DataException(message, oPlace);
+    return *poFacet;
+}
+
+void Require(bool bCondition, const char* pMessage, const Place& oPlace)
+{
+    if (!bCondition)
+        throw krv::DataException(pMessage, oPlace);
+}
+
+} // namespace
+
+BasicWriter::BasicWriter() = default;
+
+BasicWriter::BasicWriter(const std::string& fileName)
+{
+    const IRasterDataset& oRasterDataset =
+        UseFile(fileName, "Cannot open file for writing when it does not exist", Place::Current());
+    mpoChannels->moChannels = detail::AllChannels(oRasterDataset);
+    OpenDatasetOrCleanup(false);
+}
+
+BasicWriter::BasicWriter(const std::string& fileName, const std::vector<unsigned int>& oChannels)
+{
+    UseRasterDataset(RDSIf(fileName), oChannels, true, Place::Current());
+}
+
+BasicWriter::BasicWriter(const std::string& fileName, const std::vector<unsigned int>& oChannels,
+                         const std::string& format, const std::string& options)
+{
+    const Place oPlace = Place::Current();
+    if (oChannels.empty())
+        throw krv::DataException("No channels in dataset: file=" + fileName, oPlace);
+    DatasetManager& oManager = *DatasetManager::GetInstance();
+    mpoChannels->mbOwnsDataset = true;
+    mpoChannels->mpoDataset = krv::core::fileio::File(fileName).Exists()
+                                  ? oManager.Open(fileName, eUpdate)
+                                  : oManager.NewDataset(fileName, format, options);
+    if (mpoChannels->mpoDataset == nullptr)
+        throw krv::DataException("Unrecognized format: file=" + fileName, oPlace);
+    RequireFacet<IRasterDataset>(mpoChannels->mpoDataset, "Format does not support rasters: file=" + fileName, oPlace);
+    mpoChannels->moChannels = oChannels;
+    if (mpoChannels->mpoDataset->Exists())
+        OpenDatasetOrCleanup(false);
+}
+
+BasicWriter::BasicWriter(const std::string& fileName, const IChannelFilter& oFilter)
+{
+    // "Can not" and the other constructor's "Cannot" both stand, intended: callers tell the two by it.
+    const IRasterDataset& oRasterDataset =
+        UseFile(fileName, "Can not open file for writing when it does not exist", Place::Current());
+    mpoChannels->moChannels = oFilter.Accept(oRasterDataset);
+    OpenDatasetOrCleanup(false);
+}
+
+BasicWriter::BasicWriter(IBitmapDataset* poDataset, const std::vector<unsigned int>& oBitmaps)
+{
+    const Place oPlace = Place::Current();
+    Require(!oBitmaps.empty(), "You should request at least one channel.", oPlace);
+    auto* const poRoot = dynamic_cast<IDataset*>(poDataset);
+    Require(poRoot != nullptr, "Invalid bitmap Dataset", oPlace);
+    mpoChannels->mbBitmaps = true;
+    mpoChannels->mpoDataset = poRoot;
+    mpoChannels->moChannels = oBitmaps;
+    if (poRoot->Exists())
+        OpenDatasetOrCleanup(true);
+}
+
+BasicWriter::BasicWriter(IRasterDataset* poDataset, const std::vector<unsigned int>& oChannels)
+{
+    UseRasterDataset(poDataset, oChannels, false, Place::Current());
+}
+
+BasicWriter::BasicWriter(IRasterDataset* poDataset, IRasterIO* poRasterIO, const std::vector<unsigned int>& oChannels)
+{
+    std::unique_ptr<IRasterIO> oRasterIO(poRasterIO);
+    const Place oPlace = Place::Current();
+    Require(!oChannels.empty(), "Channel list can not be empty", oPlace);
+    Require(poDataset != nullptr, "Invalid Raster Dataset, poRDS can not be NULL", oPlace);
+    Require(oRasterIO != nullptr, "Invalid Raster IO, poRasterIO can not be NULL", oPlace);
+    auto* const poRoot = dynamic_cast<IDataset*>(poDataset);
+    Require(poRoot != nullptr, "poRDS is not an IDataset", oPlace);
+
+    const std::unique_ptr<IChannelInfo> oFirst(poDataset->GetChannelInfo(oChannels.front()));
+    Require(oFirst != nullptr, "The dataset gave no description of the first channel", oPlace);
+    mpoChannels->moChannels = oChannels;
+    mpoChannels->Commit(detail::OpenRasterIO(std::move(oRasterIO), oFirst->GetDataType(), oPlace));
+    mpoChannels->mpoDataset = poRoot;
+}
+
+BasicWriter::~BasicWriter() = default;
+
+// Opens a file whose image must be there already, and owns it from then on.
+IRasterDataset& BasicWriter::UseFile(const std::string& fileName, const char* pMissing, const Place& oPlace)
+{
+    mpoChannels->mpoDataset = DatasetManager::GetInstance()->Open(fileName, eUpdate);
+    mpoChannels->mbOwnsDataset = true;
+    if (mpoChannels->mpoDataset != nullptr && !mpoChannels->mpoDataset->Exists())
+        throw krv::FileNotFoundException(fileName, pMissing, oPlace);
+    return RequireFacet<IRasterDataset>(mpoChannels->mpoDataset, "Format does not support rasters: file=" + fileName,
+                                        oPlace);
+}
+
+void BasicWriter::UseRasterDataset(IRasterDataset* poDataset, const std::vector<unsigned int>& oChannels, bool bOwn,
+                                   const Place& oPlace)
+{
+    auto* const poRoot = dynamic_cast<IDataset*>(poDataset);
+    Require(poRoot != nullptr, "Invalid Raster Dataset", oPlace);
+    mpoChannels->mpoDataset = poRoot;
+    mpoChannels->mbOwnsDataset = bOwn;
+    mpoChannels->moChannels = oChannels;
+    if (poRoot->Exists())
+        OpenDatasetOrCleanup(false);
+}
+
+IRasterDataset* BasicWriter::RDSIf(const std::string& fileName)
+{
+    std::unique_ptr<IDataset> oDataset(DatasetManager::GetInstance()->Open(fileName, eUpdate));
+    auto* const poRasterDataset = dynamic_cast<IRasterDataset*>(oDataset.get());
+    if (poRasterDataset == nullptr)
+        return nullptr;
+    static_cast<void>(oDataset.release());
+    return poRasterDataset;
+}
+
+void BasicWriter::Init()
+{
+    mpoChannels->Commit(detail::OpenedChannels());
+    mpoChannels->meMarginBehaviour = eMirror;
+    mpoChannels->mnXMargin = 0;
+    mpoChannels->mnYMargin = 0;
+}
+
+void BasicWriter::OpenDataset(bool bBitmaps)
+{
+    const Place oPlace = Place::Current();
+    IDataset* const poDataset = mpoChannels->mpoDataset;
+    std::vector<unsigned int> oChannels = mpoChannels->moChannels;
+    detail::OpenedChannels oOpened;
+    if (bBitmaps)
+    {
+        auto& oBitmaps = RequireFacet<IBitmapDataset>(
+            poDataset, "Format does not support bitmaps: format=" + FormatName(*poDataset), oPlace);
+        if (oChannels.empty())
+            oChannels = oBitmaps.GetBitmapList();
+        Require(!oChannels.empty(), "No bitmap selected to write", oPlace);
+        oOpened = detail::OpenBitmaps(oBitmaps, oChannels, oPlace);
+    }
+    else
+    {
+        auto& oRasterDataset = RequireFacet<IRasterDataset>(
+            poDataset, "Format does not support rasters: format=" + FormatName(*poDataset), oPlace);
+        if (oChannels.empty())
+            oChannels = detail::AllChannels(oRasterDataset);
+        Require(!oChannels.empty(), "No channels selected to write", oPlace);
+        oOpened = detail::OpenChannels(oRasterDataset, oChannels, nullptr, oPlace);
+    }
+    mpoChannels->moChannels = std::move(oChannels);
+    mpoChannels->Commit(std::move(oOpened));
+    SetOptimalTileSize(); // virtual: a derived writer may choose its own
+}
+
+void BasicWriter::OpenDatasetOrCleanup(bool bBitmaps)
+{
+    try
+    {
+        OpenDataset(bBitmaps);
+    }
+    catch (...)
+    {
+        CleanupDataset();
+        throw;
+    }
+}
+
+void BasicWriter::CleanupDataset()
+{
+    mpoChannels->Commit(detail::OpenedChannels());
+    if (mpoChannels->mbOwnsDataset)
+        delete std::exchange(mpoChannels->mpoDataset, nullptr);
+}
+
+void BasicWriter::LazyOpen()
+{
+    if (!mpoChannels->IsOpen())
+        OpenDataset(false);
+}
+
+// A dataset that is still to be created gets the plain message instead of what its opening says.
+void BasicWriter::OpenForWriting()
+{
+    try
+    {
+        LazyOpen();
+    }
+    catch (const krv::Exception&)
+    {
+        if (mpoChannels->mpoDataset->Exists())
+            throw;
+    }
+}
+
+krv::gobs::Raster* BasicWriter::GetRaster(unsigned int nIndex)
+{
+    LazyOpen();
+    std::unique_ptr<krv::gobs::Raster> oRaster = mpoChannels->MakeTile(nIndex, Place::Current());
+    ReadRaster(oRaster.get());
+    return oRaster.release();
+}
+
+krv::gobs::Raster* BasicWriter::ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight)
+{
+    LazyOpen();
+    std::unique_ptr<krv::gobs::Raster> oRaster = mpoChannels->MakeRaster(nX, nY, nWidth, nHeight, Place::Current());
+    ReadRaster(oRaster.get());
+    return oRaster.release();
+}
+
+void BasicWriter::ReadRaster(krv::gobs::Raster* poRaster)
+{
+    const Place oPlace = Place::Current();
+    LazyOpen();
+    krv::gobs::CheckRasterCompatible(poRaster, this, oPlace);
+    mpoChannels->Read(*poRaster, oPlace);
+}
+
+void BasicWriter::FillMargins(krv::gobs::Raster* poRaster)
+{
+    mpoChannels->FillMargins(*poRaster, Place::Current());
+}
+
+void BasicWriter::SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour)
+{
+    mpoChannels->SetMargins(nXMargin, nYMargin, eBehaviour, Place::Current());
+}
+
+// No look at the I/O here, intended: a writer of a level or of bitmaps still reaches the levels of its dataset.
+IOverviewReaderAccessor* BasicWriter::GetOverviewReaderAccessor()
+{
+    LazyOpen();
+    return new BasicOverviewReaderAccessor(dynamic_cast<IRasterDataset*>(mpoChannels->mpoDataset),
+                                           mpoChannels->moChannels);
+}
+
+void BasicWriter::WriteRaster(const krv::gobs::Raster* poRaster)
+{
+    const Place oPlace = Place::Current();
+    OpenForWriting();
+    Require(mpoChannels->IsOpen(), "You have to create the dataset before trying to write to it", oPlace);
+    krv::gobs::CheckRasterCompatible(poRaster, this, oPlace);
+    mpoChannels->Write(*poRaster, oPlace);
+}
+
+bool BasicWriter::FileExists()
+{
+    return mpoChannels->mpoDataset->Exists();
+}
+
+void BasicWriter::CreateNewFile(const krv::gobs::RasterInfo& oInfo)
+{
+    const Place oPlace = Place::Current();
+    IDataset* const poDataset = mpoChannels->mpoDataset;
+    auto& oRasterDataset = RequireFacet<IRasterDataset>(
+        poDataset, "Format does not support rasters: format=" + FormatName(*poDataset), oPlace);
+    Require(!poDataset->Exists(), "The dataset already exists", oPlace);
+    std::vector<unsigned int>& oChannels = mpoChannels->moChannels;
+    Require(oChannels.empty() || oChannels.size() == oInfo.GetChansCount(),
+            "The RasterInfo does not match the write channels of this writer", oPlace);
+    if (oChannels.empty())
+    {
+        oChannels.resize(oInfo.GetChansCount());
+        std::iota(oChannels.begin(), oChannels.end(), 1u);
+    }
+    oRasterDataset.Create(oInfo);
+    OpenDataset(false);
+}
+
+void BasicWriter::SetAuxiliaryData(const AuxiliaryData& oData)
+{
+    LazyOpen();
+    AuxiliaryData oRecord = mpoChannels->mpoDataset->ReadAuxiliaryData();
+    oRecord.SetFileMetadata(oData.GetFileMetadata());
+    auto* const poBitmaps = mpoChannels->mbBitmaps ? dynamic_cast<IBitmapDataset*>(mpoChannels->mpoDataset) : nullptr;
+    unsigned int nPosition = 0;
+    for (const unsigned int nChannel : mpoChannels->moChannels)
+    {
+        ++nPosition;
+        const std::string description = oData.GetChannelDescription(nPosition);
+        if (poBitmaps != nullptr)
+        {
+            poBitmaps->SetBitmapDescription(nChannel, description);
+            poBitmaps->SetBitmapMetadata(nChannel, oData.GetChanMetadata(nPosition));
+            continue;
+        }
+        oRecord.SetChanMetadata(oData.GetChanMetadata(nPosition), nChannel);
+        oRecord.SetChannelDescription(description, nChannel);
+    }
+    mpoChannels->mpoDataset->WriteAuxiliaryData(oRecord);
+}
+
+void BasicWriter::SetCRS(const krv::ogc::cs::ICRS* poCRS)
+{
+    const Place oPlace = Place::Current();
+    LazyOpen();
+    Require(poCRS != nullptr, "The reference system is NULL", oPlace);
+    mpoChannels->mpoDataset->UpdateCRS(*poCRS);
+}
+
+void BasicWriter::SetGeocodingInfo(const krv::ogc::cs::GeocodingInfo& oInfo)
+{
+    LazyOpen();
+    if (auto* const poGeocoded = dynamic_cast<IGeocodedDataset*>(mpoChannels->mpoDataset))
+        poGeocoded->SetGeocoding(oInfo);
+}
+
+IOverviewWriterAccessor* BasicWriter::GetOverviewWriterAccessor()
+{
+    LazyOpen();
+    const bool bOnLevel = dynamic_cast<IOverviewIO*>(mpoChannels->moOpened.mpoRasterIO.get()) != nullptr;
+    if (bOnLevel || mpoChannels->mbBitmaps)
+        return nullptr;
+    return new BasicOverviewWriterAccessor(dynamic_cast<IRasterDataset*>(mpoChannels->mpoDataset),
+                                           mpoChannels->moChannels);
+}
+
+void BasicWriter::Synchronize()
+{
+    mpoChannels->mpoDataset->Synchronize();
+}
+
+} // namespace krv::datasources

@@ -1,0 +1,81 @@
+#pragma once
+
+#include "datasources/reader/rasteraccess.h"
+#include "datasources/writer/irasterwriter.h"
+#include "toolkit/exceptions/place.h"
+
+#include <string>
+#include <vector>
+
+namespace krv::datasources
+{
+
+class IBitmapDataset;
+class IChannelFilter;
+class IDataset;
+class IRasterDataset;
+class IRasterIO;
+
+// Writes the selected channels or bitmaps of one dataset and reads them back. A writer on a new file knows neither size
+// nor type before CreateNewFile: it has no tiles, and whatever needs the image opens it on first use. Nothing is
+// buffered here. A failed opening leaves the writer as it was.
+class KRV_DATASOURCES_API BasicWriter : public RasterAccess, public IRasterWriter
+{
+public:
+    // All channels of an existing file. Throws FileNotFoundException when there is none.
+    explicit BasicWriter(const std::string& fileName);
+    // Channels of an existing file, from 1; an empty list is all of them.
+    BasicWriter(const std::string& fileName, const std::vector<unsigned int>& oChannels);
+    // Channels of an existing file, or of a new one in a format, whose image CreateNewFile lays out.
+    BasicWriter(const std::string& fileName, const std::vector<unsigned int>& oChannels, const std::string& format,
+                const std::string& options);
+    // The channels of an existing file that a filter accepts; a filter that accepts none selects all, intended.
+    BasicWriter(const std::string& fileName, const IChannelFilter& oFilter);
+    // Bitmaps of a dataset that stays the caller's.
+    BasicWriter(IBitmapDataset* poDataset, const std::vector<unsigned int>& oBitmaps);
+    // Channels of a dataset that stays the caller's; an empty list is all of them.
+    BasicWriter(IRasterDataset* poDataset, const std::vector<unsigned int>& oChannels);
+    // Channels through another I/O than the dataset's own: an overview level. The writer takes the I/O over, also when
+    // the constructor throws; the dataset stays the caller's. Such a writer has no channel descriptions.
+    BasicWriter(IRasterDataset* poDataset, IRasterIO* poRasterIO, const std::vector<unsigned int>& oChannels);
+    ~BasicWriter() override;
+
+    krv::gobs::Raster* GetRaster(unsigned int nIndex) override;
+    void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour) override;
+    void ReadRaster(krv::gobs::Raster* poRaster) override;
+    krv::gobs::Raster* ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight) override;
+    IOverviewReaderAccessor* GetOverviewReaderAccessor() override;
+
+    void WriteRaster(const krv::gobs::Raster* poRaster) override;
+    bool FileExists() override;
+    void CreateNewFile(const krv::gobs::RasterInfo& oInfo) override;
+    void SetAuxiliaryData(const AuxiliaryData& oData) override;
+    void SetCRS(const krv::ogc::cs::ICRS* poCRS) override;
+    void SetGeocodingInfo(const krv::ogc::cs::GeocodingInfo& oInfo) override;
+    IOverviewWriterAccessor* GetOverviewWriterAccessor() override;
+    void Synchronize() override;
+
+protected:
+    // For derived writers, which set up their own state.
+    BasicWriter();
+
+    // Back to no channels open, no margins and eMirror.
+    void Init();
+    // Opens the selected channels, or bitmaps; commits only when everything succeeded.
+    void OpenDataset(bool bBitmaps);
+    // The same; a failure deletes an owned dataset and passes.
+    void OpenDatasetOrCleanup(bool bBitmaps);
+    void CleanupDataset();
+    void FillMargins(krv::gobs::Raster* poRaster);
+    // Opens a file for update; the caller owns the result, which is null when the file holds no image.
+    static IRasterDataset* RDSIf(const std::string& fileName);
+
+private:
+    void LazyOpen();
+    void OpenForWriting();
+    IRasterDataset& UseFile(const std::string& fileName, const char* pMissing, const krv::Place& oPlace);
+    void UseRasterDataset(IRasterDataset* poDataset, const std::vector<unsigned int>& oChannels, bool bOwn,
+                          const krv::Place& oPlace);
+};
+
+} // namespace krv::datasources

@@ -1,0 +1,29 @@
+#pragma once
+
+#include "datasources/reader/ioverviewaccessor.h"
+
+#include <string>
+
+namespace krv::datasources
+{
+
+class IRasterWriter;
+
+// Makes and writes the overview levels of a fixed list of channels. A channel is a position in the list, from 1.
+// The order of the virtual operations is fixed.
+class KRV_DATASOURCES_API IOverviewWriterAccessor : public IOverviewAccessor
+{
+public:
+    ~IOverviewWriterAccessor() override;
+
+    // A new writer over a level, owned by the caller; accessor and dataset outlive it.
+    virtual IRasterWriter* CreateRasterWriter(unsigned int nLevel) = 0;
+    // Lays out a level for all channels of the file.
+    virtual void CreateLevel(unsigned int nLevel) = 0;
+    virtual void SetValid(unsigned int nChannel, unsigned int nLevel, bool bValid) = 0;
+    virtual void SetLevelValid(unsigned int nLevel, bool bValid) = 0;
+    // NEAREST, AVERAGE, MODE, BILINEAR, CUBIC, LANCZOS, RMS, MIN, MAX or NONE, in any letter case.
+    virtual void SetResamplingName(const std::string& oName) = 0;
+};
+
+} // namespace krv::datasources

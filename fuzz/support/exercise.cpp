@@ -1,0 +1,169 @@
+#include "fuzz/support/exercise.h"
+
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/ichannelinfo.h"
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "datasources/metadata/auxiliarydata.h"
+#include "datasources/metadata/displaydefaults.h"
+#include "datasources/metadata/typednodata.h"
+#include "datasources/reader/basicoverviewreaderaccessor.h"
+#include "datasources/reader/basicreader.h"
+#include "gobs/mask/imaskbuilder.h"
+#include "gobs/pct/pct.h"
+#include "gobs/raster/raster.h"
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/ogc/cs/geocodinginfo.h"
+#include "toolkit/ogc/cs/icrs.h"
+
+#include <algorithm>
+#include <functional>
+#include <memory>
+#include <vector>
+
+namespace krv::fuzz
+{
+
+namespace
+{
+
+using namespace krv::datasources;
+
+constexpr unsigned int MAX_CHANNELS = 4;
+constexpr unsigned int MAX_TILE = 256;
+
+// One question; a refusal is as good an answer as any.
+void Ask(const std::function<void()>& oQuestion)
+{
+    try
+    {
+        oQuestion();
+    }
+    catch (const krv::Exception&)
+    {
+    }
+}
+
+// The first tile, the last and one in between, with margins of which some lie outside.
+void ReadTiles(IRasterReader& oReader)
+{
+    oReader.SetTileSize(std::min(oReader.GetTileWidth(), MAX_TILE), std::min(oReader.GetTileHeight(), MAX_TILE));
+    oReader.SetMargins(3, 2, eReplicate);
+    const unsigned int nTiles = oReader.GetTileCount();
+    for (const unsigned int nTile : {0U, nTiles / 2, nTiles - 1})
+        Ask([&] { const std::unique_ptr<krv::gobs::Raster> oRaster(oReader.GetRaster(nTile)); });
+}
+
+// The first channels that have the type of channel nFirst.
+std::vector<unsigned int> ChannelsLike(const IRasterDataset& oRasters, unsigned int nFirst)
+{
+    const std::unique_ptr<IChannelInfo> oFirst(oRasters.GetChannelInfo(nFirst));
+    std::vector<unsigned int> oChannels;
+    for (unsigned int n = nFirst; n <= oRasters.GetChanCount() && oChannels.size() < MAX_CHANNELS; ++n)
+    {
+        const std::unique_ptr<IChannelInfo> oOther(oRasters.GetChannelInfo(n));
+        if (oOther->GetDataType() == oFirst->GetDataType())
+            oChannels.push_back(n);
+    }
+    return oChannels;
+}
+
+void ExerciseRasters(IDataset& oDataset, IRasterDataset& oRasters)
+{
+    const std::vector<unsigned int> oChannels = ChannelsLike(oRasters, 1);
+    Ask(
+        [&]
+        {
+            BasicReader oReader(&oDataset, oChannels, false);
+            ReadTiles(oReader);
+        });
+    BasicOverviewReaderAccessor oLevels(&oRasters, oChannels);
+    for (const unsigned int nLevel : oLevels.GetLevels())
+        Ask(
+            [&]
+            {
+                oLevels.GetAuxiliaryData(nLevel);
+                const std::unique_ptr<IRasterReader> oReader(oLevels.CreateRasterReader(nLevel));
+                ReadTiles(*oReader);
+            });
+}
+
+void ExerciseColours(const IPCTDataset& oTables)
+{
+    for (const unsigned int nTable : oTables.GetPCTList())
+    {
+        const std::unique_ptr<krv::gobs::PCT> oTable(oTables.GetPCT(nTable));
+        oTables.GetPCTChannel(nTable);
+        oTables.GetPCTDescription(nTable);
+    }
+}
+
+void ExerciseDisplay(IDataset& oDataset)
+{
+    std::string file, layer;
+    unsigned int nNumber = 0;
+    GetDefaultRed(&oDataset);
+    GetDefaultPCT(&oDataset, 1, file, layer, nNumber);
+}
+
+} // namespace
+
+void ExerciseDescription(IDataset& oDataset)
+{
+    Ask(
+        [&]
+        {
+            const AuxiliaryData oTags = oDataset.ReadAuxiliaryData();
+            for (unsigned int n = 1; n <= oTags.GetChannelCount(); ++n)
+                Ask([&] { GetTypedNoData(oTags, n); });
+            Ask(
+                [&]
+                {
+                    const std::unique_ptr<krv::gobs::IMaskBuilder> oMasks(
+                        GetTypedNoDataMaskBuilder(oTags, krv::gobs::BkgdRule{}, true));
+                });
+        });
+    Ask(
+        [&]
+        {
+            const std::unique_ptr<krv::ogc::cs::ICRS> oSystem(oDataset.ReadCRS());
+            if (oSystem)
+                oSystem->GetWKT();
+        });
+    Ask(
+        [&]
+        {
+            if (const auto* poGeocoded = dynamic_cast<IGeocodedDataset*>(&oDataset))
+                poGeocoded->GetGeocoding().IsInvertible();
+        });
+    Ask(
+        [&]
+        {
+            if (const auto* poTables = dynamic_cast<IPCTDataset*>(&oDataset))
+                ExerciseColours(*poTables);
+        });
+    Ask([&] { ExerciseDisplay(oDataset); });
+}
+
+void ExerciseFile(const std::string& fileName)
+{
+    Ask(
+        [&]
+        {
+            const std::unique_ptr<IDataset> oDataset(DatasetManager::GetInstance()->Open(fileName, eReadOnly));
+            ExerciseDescription(*oDataset);
+            if (auto* poRasters = dynamic_cast<IRasterDataset*>(oDataset.get()))
+                Ask([&] { ExerciseRasters(*oDataset, *poRasters); });
+            auto* poBitmaps = dynamic_cast<IBitmapDataset*>(oDataset.get());
+            if (poBitmaps != nullptr && !poBitmaps->GetBitmapList().empty())
+            {
+                BasicReader oReader(poBitmaps, {}, false);
+                ReadTiles(oReader);
+            }
+        });
+}
+
+} // namespace krv::fuzz

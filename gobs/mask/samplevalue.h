@@ -1,0 +1,48 @@
+#pragma once
+
+#include "gobs/api.h"
+
+#include <cstdint>
+#include <string>
+
+namespace krv::gobs
+{
+
+// A number to compare pixel values with: any integer of 64 bits, signed or not, exactly, or a real with NaN and the
+// infinities. A plain value.
+class KRV_GOBS_API SampleValue
+{
+public:
+    enum eKind
+    {
+        eUnsigned = 0,
+        eNegative = 1, // an integer below 0
+        eReal = 2
+    };
+
+    static SampleValue FromUnsigned(std::uint64_t nValue);
+    static SampleValue FromSigned(std::int64_t nValue);
+    static SampleValue FromReal(double nValue);
+
+    eKind GetKind() const { return meKind; }
+    bool IsNaN() const { return meKind == eReal && mnReal != mnReal; }
+
+    // Only for the kind that they name.
+    std::uint64_t GetUnsigned() const { return mnBits; }
+    std::int64_t GetNegative() const { return static_cast<std::int64_t>(mnBits); }
+    // For every kind; integers are rounded to nearest.
+    double GetReal() const;
+
+    // Decimal digits for integers, the shortest text that reads back the same for reals; "nan", "inf", "-inf".
+    // No locale takes part.
+    std::string GetText() const;
+
+private:
+    SampleValue(eKind eOfValue, std::uint64_t nBits, double nReal) : meKind(eOfValue), mnBits(nBits), mnReal(nReal) {}
+
+    eKind meKind;
+    std::uint64_t mnBits;
+    double mnReal;
+};
+
+} // namespace krv::gobs

@@ -1,0 +1,56 @@
+#pragma once
+
+#include "gobs/api.h"
+#include "gobs/pct/rgbtuple.h"
+
+#include <cstdint>
+#include <vector>
+
+namespace krv::gobs
+{
+
+// A pseudocolour table: half-open ranges of values [low, high), the last one closed, sorted, each with a colour.
+// Colours are kept in 16 bits per part, as files hold them; 8-bit colours are 257 times their value.
+class KRV_GOBS_API PCT
+{
+public:
+    struct Entry
+    {
+        double low;
+        double high;
+        RGBTuple<std::uint16_t> colour;
+        std::uint16_t alpha = 65535;
+    };
+
+    // No entries: every value is the background colour.
+    PCT() = default;
+
+    // Entry i covers [i, i + 1): the colour map of an index channel.
+    static PCT FromColours(const std::vector<RGBTuple<std::uint16_t>>& oColours);
+
+    // Keeps the entries sorted. Throws ParameterException for an empty, reversed, NaN or overlapping range.
+    void Add(const Entry& oEntry);
+
+    // The colour of a value: that of its range; below the first range the first colour, above the last the last; in a
+    // gap the range before it; NaN, and a table without entries, give the background colour.
+    RGBTuple<unsigned char> GetValue(double nValue) const;
+    // The same in 16 bits, with alpha; the background's alpha is 0.
+    RGBTuple<std::uint16_t> GetValue16(double nValue, std::uint16_t& nAlpha) const;
+
+    // Linear interpolation between the centres of neighbouring ranges; off at first.
+    void SetInterpolation(bool bInterpolate) { mbInterpolate = bInterpolate; }
+    bool GetInterpolation() const { return mbInterpolate; }
+    void SetBackground(const RGBTuple<unsigned char>& oColour) { moBackground = oColour; }
+    const RGBTuple<unsigned char>& GetBackground() const { return moBackground; }
+    bool HasAlpha() const;
+    const std::vector<Entry>& GetEntries() const { return moEntries; }
+
+private:
+    const Entry* Find(double nValue) const;
+
+    std::vector<Entry> moEntries;
+    RGBTuple<unsigned char> moBackground;
+    bool mbInterpolate = false;
+};
+
+} // namespace krv::gobs

@@ -1,0 +1,57 @@
+#pragma once
+
+#include "gobs/api.h"
+#include "gobs/raster/rasterinfo.h"
+
+#include <cstdint>
+
+namespace krv::gobs
+{
+
+// A rectangle of pixels with margins around it. The buffer covers (width + 2 * x margin) by (height + 2 * y margin)
+// pixels, rows top to bottom, pixel interleaved without padding: the value of a channel of a pixel has the index
+// ((row * full width) + column) * channels + channel. One-bit rasters are packed, most significant bit first.
+// Buffers are 64-byte aligned; their contents are undefined until somebody fills them.
+class KRV_GOBS_API Raster
+{
+public:
+    // Allocates the buffer (HMalloc). Throws DataException when its size overflows, std::bad_alloc without memory.
+    Raster(const RasterInfo& oInfo, const RasterContext& oContext);
+
+    // Wraps a buffer of GetBufferSize() bytes. With `bTakeOwnership` the buffer came from HMalloc and goes to HFree
+    // with the raster, or at once when this throws; otherwise it is the caller's and must live as long as the raster.
+    // Throws DataException for a null buffer.
+    Raster(const RasterInfo& oInfo, const RasterContext& oContext, unsigned char* pBuffer, bool bTakeOwnership);
+
+    ~Raster();
+    Raster(const Raster&) = delete;
+    Raster& operator=(const Raster&) = delete;
+
+    const RasterInfo& GetInfo() const { return moInfo; }
+    const RasterContext& GetContext() const { return moContext; }
+    unsigned int GetWidth() const { return moInfo.GetWidth(); }
+    unsigned int GetHeight() const { return moInfo.GetHeight(); }
+    unsigned int GetChansCount() const { return moInfo.GetChansCount(); }
+    const DataType& GetDataType() const { return moInfo.GetDataType(); }
+    int GetX() const { return moContext.GetX(); }
+    int GetY() const { return moContext.GetY(); }
+    unsigned int GetXMargin() const { return moContext.GetXMargin(); }
+    unsigned int GetYMargin() const { return moContext.GetYMargin(); }
+
+    // Margins included.
+    std::uint64_t GetFullWidth() const { return GetWidth() + 2ull * GetXMargin(); }
+    std::uint64_t GetFullHeight() const { return GetHeight() + 2ull * GetYMargin(); }
+    std::uint64_t GetBufferSize() const { return mnBufferSize; }
+
+    unsigned char* GetBuffer() { return mpBuffer; }
+    const unsigned char* GetBuffer() const { return mpBuffer; }
+
+private:
+    RasterInfo moInfo;
+    RasterContext moContext;
+    std::uint64_t mnBufferSize;
+    unsigned char* mpBuffer;
+    bool mbOwnsBuffer;
+};
+
+} // namespace krv::gobs

@@ -1,0 +1,57 @@
+#pragma once
+
+#include "gobs/raster/datatype.h"
+
+namespace krv::gobs
+{
+
+// What a raster is: the size of its centre in pixels, its channel count and its type. Margins are not counted.
+class RasterInfo
+{
+public:
+    RasterInfo() = default;
+    RasterInfo(unsigned int nWidth, unsigned int nHeight, unsigned int nChannels, const DataType& oType)
+        : mnWidth(nWidth), mnHeight(nHeight), mnChannels(nChannels), moType(oType)
+    {
+    }
+
+    unsigned int GetWidth() const { return mnWidth; }
+    unsigned int GetHeight() const { return mnHeight; }
+    unsigned int GetChansCount() const { return mnChannels; }
+    const DataType& GetDataType() const { return moType; }
+
+    friend bool operator==(const RasterInfo&, const RasterInfo&) = default;
+
+private:
+    unsigned int mnWidth = 0;
+    unsigned int mnHeight = 0;
+    unsigned int mnChannels = 0;
+    DataType moType;
+};
+
+// Where a raster is: the image position of its centre's first pixel (it may lie outside the image) and the margins
+// around the centre, in pixels, the same left and right, and the same above and below.
+class RasterContext
+{
+public:
+    RasterContext() = default;
+    RasterContext(int nX, int nY, unsigned int nXMargin = 0, unsigned int nYMargin = 0)
+        : mnX(nX), mnY(nY), mnXMargin(nXMargin), mnYMargin(nYMargin)
+    {
+    }
+
+    int GetX() const { return mnX; }
+    int GetY() const { return mnY; }
+    unsigned int GetXMargin() const { return mnXMargin; }
+    unsigned int GetYMargin() const { return mnYMargin; }
+
+    friend bool operator==(const RasterContext&, const RasterContext&) = default;
+
+private:
+    int mnX = 0;
+    int mnY = 0;
+    unsigned int mnXMargin = 0;
+    unsigned int mnYMargin = 0;
+};
+
+} // namespace krv::gobs

@@ -1,0 +1,36 @@
+#include "plugins/support/builder.h"
+
+#include "toolkit/exceptions/exceptions.h"
+
+namespace krv::plugins::support
+{
+
+FormatDescription::FormatDescription(const std::string& description, const std::vector<std::string>& oExtensions,
+                                     const std::string& shortName)
+    : ABSFileFormat(oExtensions, shortName), moDescription(description)
+{
+}
+
+FormatDescription::~FormatDescription() = default;
+
+Builder::Builder(const std::string& description, const std::vector<std::string>& oExtensions,
+                 const std::string& shortName)
+    : moFormat(description, oExtensions, shortName)
+{
+}
+
+Builder::~Builder() = default;
+
+krv::datasources::IDataset* Builder::Create(const std::string& fileName, const std::string&)
+{
+    throw DataException(fileName + ": the format " + moFormat.GetShortName() + " cannot create files");
+}
+
+void Builder::CheckReadOnly(const std::string& fileName, AccessMode eMode, const Place& oPlace) const
+{
+    if (eMode == eUpdate)
+        throw DataException(
+            fileName + ": the format " + moFormat.GetShortName() + " cannot update files; open it read-only", oPlace);
+}
+
+} // namespace krv::plugins::support

@@ -1,0 +1,46 @@
+#pragma once
+
+#include "datasources/interfaces/ifileformat.h"
+#include "datasources/interfaces/ifileiobuilder.h"
+#include "toolkit/exceptions/place.h"
+
+#include <string>
+#include <vector>
+
+namespace krv::plugins::support
+{
+
+// The description of a format, given as plain values.
+class FormatDescription : public krv::datasources::ABSFileFormat
+{
+public:
+    FormatDescription(const std::string& description, const std::vector<std::string>& oExtensions,
+                      const std::string& shortName);
+    ~FormatDescription() override;
+
+    std::string GetDescription() const override { return moDescription; }
+
+private:
+    std::string moDescription;
+};
+
+// A builder that opens files only: Create throws DataException until a format overrides it. A format adds Open and
+// Identify.
+class Builder : public krv::datasources::IFileIOBuilder
+{
+public:
+    Builder(const std::string& description, const std::vector<std::string>& oExtensions, const std::string& shortName);
+    ~Builder() override;
+
+    krv::datasources::IFileFormat* GetFileFormat() override { return &moFormat; }
+    krv::datasources::IDataset* Create(const std::string& fileName, const std::string& options) override;
+
+protected:
+    // Throws DataException for eUpdate, for formats that only read.
+    void CheckReadOnly(const std::string& fileName, AccessMode eMode, const Place& oPlace = Place::Current()) const;
+
+private:
+    FormatDescription moFormat;
+};
+
+} // namespace krv::plugins::support

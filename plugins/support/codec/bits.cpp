@@ -1,0 +1,405 @@
+#include "plugins/support/codec/bits.h"
+
+#include "plugins/support/codec/detail/memoryaccess.h"
+#include "plugins/support/codec/detail/vector16.h"
+
+#include <algorithm>
+#include <array>
+
+namespace krv::plugins::codec
+{
+
+namespace
+{
+
+using detail::Load;
+using detail::Store;
+using detail::Swap;
+
+// Bits packed most significant first.
+struct BitSource
+{
+    const unsigned char* mpoBytes;
+    std::size_t mnBytes;
+
+    // The sixty-four bits from nBit on; the last seven of them are unspecified. Needs eight bytes.
+    std::uint64_t GetInside(std::uint64_t nBit) const
+    {
+        return detail::LoadBigEndian<std::uint64_t>(mpoBytes + (nBit >> 3)) << (nBit & 7);
+    }
+
+    // nBits bits from nBit on, at the top of the result. Bits behind the end are 0.
+    std::uint64_t GetAnywhere(std::uint64_t nBit, unsigned int nBits) const
+    {
+        std::uint64_t nValue = 0;
+        for (unsigned int i = 0; i < nBits; ++i, ++nBit)
+            if ((nBit >> 3) < mnBytes)
+                nValue |= static_cast<std::uint64_t>((mpoBytes[nBit >> 3] >> (7 - (nBit & 7))) & 1) << (63 - i);
+        return nValue;
+    }
+};
+
+template <typename Signed>
+Signed TakeTop(std::uint64_t nValue, unsigned int nBits, bool bSigned)
+{
+    return bSigned ? static_cast<Signed>(static_cast<std::int64_t>(nValue) >> (64 - nBits))
+                   : static_cast<Signed>(nValue >> (64 - nBits));
+}
+
+// How many samples of a row can be read by whole words.
+std::size_t CountInside(std::size_t nBytes, std::uint64_t nFirstBit, std::size_t nSamples, unsigned int nBits)
+{
+    if (nBytes < 8 || nFirstBit > (std::uint64_t{nBytes} - 8) * 8 || nBits > 57)
+        return 0;
+    return std::min<std::uint64_t>(nSamples, ((std::uint64_t{nBytes} - 8) * 8 - nFirstBit) / nBits + 1);
+}
+
+// Floating-point numbers of fewer bits than 32, beside those: what turns one into the other.
+template <unsigned int nExponentBits, unsigned int nFractionBits>
+struct NarrowFloat
+{
+    static constexpr std::uint32_t MAGNITUDE = (1U << (nExponentBits + nFractionBits)) - 1;
+    static constexpr std::uint32_t SIGN_SHIFT = 31 - nExponentBits - nFractionBits;
+    static constexpr std::uint32_t BIAS_GAP = (128U - (1U << (nExponentBits - 1))) << 23;
+    static constexpr std::uint32_t INFINITE = ((1U << nExponentBits) - 1) << nFractionBits;
+    static constexpr std::uint32_t SMALLEST_NORMAL = 1U << nFractionBits;
+    // The smallest number there is, as one of 32 bits.
+    static constexpr std::uint32_t STEP = (128U - (1U << (nExponentBits - 1)) + 1 - nFractionBits) << 23;
+};
+
+#if defined(KRV_CODEC_VECTORS)
+using detail::LoadVector;
+using detail::Shuffle;
+using detail::StoreVector;
+using detail::Vector;
+
+constexpr unsigned int WIDEST_IN_VECTORS = 25; // with seven bits in front of it, a sample still fits four bytes
+
+// Takes four samples of nBits bits, of which the first begins nPhase bits into the first of sixteen bytes.
+class FourSamples
+{
+public:
+    FourSamples(unsigned int nBits, unsigned int nPhase, bool bSigned)
+        : moDown(_mm_cvtsi32_si128(static_cast<int>(32 - nBits))), mbSigned(bSigned)
+    {
+        alignas(16) std::int32_t aFactors[4];
+        for (unsigned int i = 0; i < 4; ++i)
+            aFactors[i] = 1 << ((nPhase + i * nBits) & 7);
+        moUp = _mm_load_si128(reinterpret_cast<const __m128i*>(aFactors));
+        moBytes = Shuffle::Make([&](std::size_t i) { return (nPhase + i / 4 * nBits) / 8 + 3 - i % 4; });
+    }
+
+    Vector Take(Vector oBytes) const
+    {
+        const Vector oTop = _mm_mullo_epi32(moBytes(oBytes), moUp);
+        return mbSigned ? _mm_sra_epi32(oTop, moDown) : _mm_srl_epi32(oTop, moDown);
+    }
+
+private:
+    Shuffle moBytes;
+    Vector moUp;
+    Vector moDown;
+    bool mbSigned;
+};
+
+// Eight samples, given as words of four bytes, in words of the size of Signed.
+template <typename Signed>
+void StoreEight(unsigned char* destination, Vector oFirst, Vector oSecond, bool bSigned)
+{
+    if constexpr (sizeof(Signed) == 4)
+    {
+        StoreVector(destination, oFirst);
+        StoreVector(destination + 16, oSecond);
+        return;
+    }
+    const Vector oWords = bSigned ? _mm_packs_epi32(oFirst, oSecond) : _mm_packus_epi32(oFirst, oSecond);
+    if constexpr (sizeof(Signed) == 2)
+        StoreVector(destination, oWords);
+    else
+        Store(destination, bSigned ? _mm_cvtsi128_si64(_mm_packs_epi16(oWords, oWords))
+                                   : _mm_cvtsi128_si64(_mm_packus_epi16(oWords, oWords)));
+}
+
+// Eight samples at a time, which take nBits bytes, from the beginning of a row on. Returns the samples done.
+template <typename Signed, bool bSigned>
+std::size_t UnpackVectors(const unsigned char* source, std::size_t nBytes, unsigned char* destination,
+                          std::size_t nSamples, unsigned int nBits)
+{
+    const FourSamples oFirst(nBits, 0, bSigned), oSecond(nBits, nBits * 4 % 8, bSigned);
+    const std::size_t nSecond = nBits / 2;
+    std::size_t i = 0;
+    for (std::size_t nAt = 0; i + 8 <= nSamples && nAt + nSecond + 16 <= nBytes; i += 8, nAt += nBits)
+        StoreEight<Signed>(destination + i * sizeof(Signed), oFirst.Take(LoadVector(source + nAt)),
+                           oSecond.Take(LoadVector(source + nAt + nSecond)), bSigned);
+    return i;
+}
+
+template <typename Signed>
+std::size_t UnpackVectors(const BitSource& oSource, std::uint64_t nBit, unsigned char* destination,
+                          std::size_t nSamples, unsigned int nBits, bool bSigned)
+{
+    if (nBits > WIDEST_IN_VECTORS || (nBit >> 3) >= oSource.mnBytes)
+        return 0;
+    const unsigned char* row = oSource.mpoBytes + (nBit >> 3);
+    const std::size_t nBytes = oSource.mnBytes - (nBit >> 3);
+    return bSigned ? UnpackVectors<Signed, true>(row, nBytes, destination, nSamples, nBits)
+                   : UnpackVectors<Signed, false>(row, nBytes, destination, nSamples, nBits);
+}
+
+// Four integers of three bytes, out of the first twelve bytes, as words of four.
+template <bool bBigEndian, bool bSigned>
+Vector TakeFour24(const unsigned char* source)
+{
+    static constexpr Shuffle TOP =
+        Shuffle::Make([](std::size_t i)
+                      { return i % 4 == 0 ? std::size_t{0x80} : i / 4 * 3 + (bBigEndian ? 3 - i % 4 : i % 4 - 1); });
+    const Vector oTop = TOP(LoadVector(source));
+    return bSigned ? _mm_srai_epi32(oTop, 8) : _mm_srli_epi32(oTop, 8);
+}
+
+template <bool bBigEndian, bool bSigned>
+std::size_t Unpack24Vectors(const unsigned char* source, unsigned char* destination, std::size_t nCount)
+{
+    std::size_t i = 0;
+    for (; i + 6 <= nCount; i += 4)
+        StoreVector(destination + i * 4, TakeFour24<bBigEndian, bSigned>(source + i * 3));
+    return i;
+}
+
+// Four numbers with fewer exponent and fraction bits as ones of 32 bits.
+template <unsigned int nExponentBits, unsigned int nFractionBits>
+Vector WidenFour(Vector oNumbers)
+{
+    using Format = NarrowFloat<nExponentBits, nFractionBits>;
+    const Vector oMagnitude = _mm_and_si128(oNumbers, _mm_set1_epi32(Format::MAGNITUDE));
+    const Vector oSign =
+        _mm_slli_epi32(_mm_andnot_si128(_mm_set1_epi32(Format::MAGNITUDE), oNumbers), Format::SIGN_SHIFT);
+    const Vector oGap = _mm_set1_epi32(Format::BIAS_GAP);
+    const __m128 oSmall = _mm_mul_ps(_mm_cvtepi32_ps(oMagnitude), _mm_castsi128_ps(_mm_set1_epi32(Format::STEP)));
+    const Vector oNormal = _mm_add_epi32(_mm_slli_epi32(oMagnitude, 23 - nFractionBits), oGap);
+    const Vector oIsSmall = _mm_cmplt_epi32(oMagnitude, _mm_set1_epi32(Format::SMALLEST_NORMAL));
+    const Vector oFinite = _mm_blendv_epi8(oNormal, _mm_castps_si128(oSmall), oIsSmall);
+    const Vector oIsInfinite = _mm_cmpgt_epi32(oMagnitude, _mm_set1_epi32(Format::INFINITE - 1));
+    return _mm_or_si128(_mm_add_epi32(oFinite, _mm_and_si128(oIsInfinite, oGap)), oSign);
+}
+
+std::size_t WidenHalfs(const unsigned char* source, unsigned char* destination, std::size_t nCount)
+{
+    std::size_t i = 0;
+    for (; i + 8 <= nCount; i += 8)
+    {
+        const Vector oHalfs = LoadVector(source + i * 2), oNone = _mm_setzero_si128();
+        StoreVector(destination + i * 4, WidenFour<5, 10>(_mm_unpacklo_epi16(oHalfs, oNone)));
+        StoreVector(destination + i * 4 + 16, WidenFour<5, 10>(_mm_unpackhi_epi16(oHalfs, oNone)));
+    }
+    return i;
+}
+
+std::size_t Widen24s(const unsigned char* source, unsigned char* destination, std::size_t nCount)
+{
+    std::size_t i = 0;
+    for (; i + 6 <= nCount; i += 4)
+        StoreVector(destination + i * 4, WidenFour<7, 16>(TakeFour24<false, false>(source + i * 3)));
+    return i;
+}
+
+std::size_t ReverseVectors(const unsigned char* source, unsigned char* destination, std::size_t nBytes)
+{
+    static constexpr Shuffle TURNED =
+        Shuffle::Make([](std::size_t i) { return (i & 1) << 3 | (i & 2) << 1 | (i & 4) >> 1 | (i & 8) >> 3; });
+    const Vector oTurned = LoadVector(TURNED.maIndices);
+    const Vector oLowBits = _mm_set1_epi8(15);
+    std::size_t i = 0;
+    for (; i + 16 <= nBytes; i += 16)
+    {
+        const Vector oBytes = LoadVector(source + i);
+        const Vector oLow = _mm_shuffle_epi8(oTurned, _mm_and_si128(oBytes, oLowBits));
+        const Vector oHigh = _mm_shuffle_epi8(oTurned, _mm_and_si128(_mm_srli_epi16(oBytes, 4), oLowBits));
+        StoreVector(destination + i, _mm_or_si128(_mm_slli_epi16(oLow, 4), oHigh));
+    }
+    return i;
+}
+#else
+template <typename Signed>
+std::size_t UnpackVectors(const BitSource&, std::uint64_t, unsigned char*, std::size_t, unsigned int, bool)
+{
+    return 0;
+}
+
+template <bool, bool>
+std::size_t Unpack24Vectors(const unsigned char*, unsigned char*, std::size_t)
+{
+    return 0;
+}
+
+std::size_t WidenHalfs(const unsigned char*, unsigned char*, std::size_t)
+{
+    return 0;
+}
+std::size_t Widen24s(const unsigned char*, unsigned char*, std::size_t)
+{
+    return 0;
+}
+std::size_t ReverseVectors(const unsigned char*, unsigned char*, std::size_t)
+{
+    return 0;
+}
+#endif
+
+template <typename Signed>
+void UnpackRow(const BitSource& oSource, std::uint64_t nBit, unsigned char* destination, std::size_t nSamples,
+               unsigned int nBits, bool bSigned)
+{
+    std::size_t i = UnpackVectors<Signed>(oSource, nBit, destination, nSamples, nBits, bSigned);
+    nBit += std::uint64_t{i} * nBits;
+    const std::size_t nInside = i + CountInside(oSource.mnBytes, nBit, nSamples - i, nBits);
+    for (; i < nInside; ++i, nBit += nBits)
+        Store(destination + i * sizeof(Signed), TakeTop<Signed>(oSource.GetInside(nBit), nBits, bSigned));
+    for (; i < nSamples; ++i, nBit += nBits)
+        Store(destination + i * sizeof(Signed), TakeTop<Signed>(oSource.GetAnywhere(nBit, nBits), nBits, bSigned));
+}
+
+template <typename Signed>
+void UnpackRows(const BitSource& oSource, std::size_t nSourcePitch, unsigned char* destination,
+                std::size_t nDestinationPitch, std::size_t nSamples, std::size_t nRows, unsigned int nBits,
+                bool bSigned)
+{
+    for (std::size_t i = 0; i < nRows; ++i)
+        UnpackRow<Signed>(oSource, std::uint64_t{i} * nSourcePitch * 8, destination + i * nDestinationPitch, nSamples,
+                          nBits, bSigned);
+}
+
+// A number with fewer exponent and fraction bits as one of 32 bits.
+template <unsigned int nExponentBits, unsigned int nFractionBits>
+std::uint32_t Widen(std::uint32_t nNumber)
+{
+    using Format = NarrowFloat<nExponentBits, nFractionBits>;
+    const std::uint32_t nMagnitude = nNumber & Format::MAGNITUDE;
+    const float nSmall = static_cast<float>(nMagnitude) * std::bit_cast<float>(Format::STEP);
+    const std::uint32_t nNormal = (nMagnitude << (23 - nFractionBits)) + Format::BIAS_GAP;
+    const std::uint32_t nFinite = nMagnitude < Format::SMALLEST_NORMAL ? std::bit_cast<std::uint32_t>(nSmall) : nNormal;
+    return (nFinite + (nMagnitude >= Format::INFINITE ? Format::BIAS_GAP : 0)) | (nNumber & ~Format::MAGNITUDE)
+                                                                                     << Format::SIGN_SHIFT;
+}
+
+constexpr std::uint64_t ReverseEach(std::uint64_t nValue)
+{
+    nValue = ((nValue >> 1) & 0x5555555555555555U) | ((nValue & 0x5555555555555555U) << 1);
+    nValue = ((nValue >> 2) & 0x3333333333333333U) | ((nValue & 0x3333333333333333U) << 2);
+    return ((nValue >> 4) & 0x0F0F0F0F0F0F0F0FU) | ((nValue & 0x0F0F0F0F0F0F0F0FU) << 4);
+}
+
+template <typename T>
+void SwapEach(const unsigned char* source, unsigned char* destination, std::size_t nCount)
+{
+    std::size_t i = 0;
+#if defined(KRV_CODEC_VECTORS)
+    for (constexpr std::size_t STEP = 16 / sizeof(T); i + STEP <= nCount; i += STEP)
+        detail::StoreVector(destination + i * sizeof(T),
+                            detail::SwapVector<T>(detail::LoadVector(source + i * sizeof(T))));
+#endif
+    for (; i < nCount; ++i)
+        Store(destination + i * sizeof(T), Swap(Load<T>(source + i * sizeof(T))));
+}
+
+void SwapOdd(const unsigned char* source, unsigned char* destination, std::size_t nCount, std::size_t nSampleBytes)
+{
+    std::array<unsigned char, 8> oSample{};
+    for (std::size_t i = 0; i < nCount * nSampleBytes; i += nSampleBytes)
+    {
+        std::reverse_copy(source + i, source + i + nSampleBytes, oSample.begin());
+        std::copy_n(oSample.begin(), nSampleBytes, destination + i);
+    }
+}
+
+} // namespace
+
+std::size_t GetContainerBytes(unsigned int nBits)
+{
+    return nBits <= 8 ? 1 : nBits <= 16 ? 2 : nBits <= 32 ? 4 : 8;
+}
+
+void UnpackBits(const unsigned char* source, std::size_t nSourceBytes, std::size_t nSourcePitch,
+                unsigned char* destination, std::size_t nDestinationPitch, std::size_t nRowSamples, std::size_t nRows,
+                unsigned int nBits, bool bSigned)
+{
+    const BitSource oSource{source, nSourceBytes};
+    switch (GetContainerBytes(nBits))
+    {
+    case 1:
+        return UnpackRows<std::int8_t>(oSource, nSourcePitch, destination, nDestinationPitch, nRowSamples, nRows, nBits,
+                                       bSigned);
+    case 2:
+        return UnpackRows<std::int16_t>(oSource, nSourcePitch, destination, nDestinationPitch, nRowSamples, nRows,
+                                        nBits, bSigned);
+    case 4:
+        return UnpackRows<std::int32_t>(oSource, nSourcePitch, destination, nDestinationPitch, nRowSamples, nRows,
+                                        nBits, bSigned);
+    default:
+        return UnpackRows<std::int64_t>(oSource, nSourcePitch, destination, nDestinationPitch, nRowSamples, nRows,
+                                        nBits, bSigned);
+    }
+}
+
+void Unpack24(const unsigned char* source, unsigned char* destination, std::size_t nCount, bool bBigEndian,
+              bool bSigned)
+{
+    std::size_t i = 0;
+    if (bBigEndian)
+        i = bSigned ? Unpack24Vectors<true, true>(source, destination, nCount)
+                    : Unpack24Vectors<true, false>(source, destination, nCount);
+    else
+        i = bSigned ? Unpack24Vectors<false, true>(source, destination, nCount)
+                    : Unpack24Vectors<false, false>(source, destination, nCount);
+    for (; i < nCount; ++i)
+    {
+        const unsigned char* at = source + i * 3;
+        const std::uint32_t nHigh = bBigEndian ? at[0] : at[2];
+        const std::uint32_t nLow = bBigEndian ? at[2] : at[0];
+        const std::uint32_t nTop = nHigh << 24 | static_cast<std::uint32_t>(at[1]) << 16 | nLow << 8;
+        Store(destination + i * 4,
+              bSigned ? static_cast<std::uint32_t>(static_cast<std::int32_t>(nTop) >> 8) : nTop >> 8);
+    }
+}
+
+void HalfToFloat(const unsigned char* source, unsigned char* destination, std::size_t nCount)
+{
+    for (std::size_t i = WidenHalfs(source, destination, nCount); i < nCount; ++i)
+        Store(destination + i * 4, Widen<5, 10>(Load<std::uint16_t>(source + i * 2)));
+}
+
+void Float24ToFloat(const unsigned char* source, unsigned char* destination, std::size_t nCount)
+{
+    for (std::size_t i = Widen24s(source, destination, nCount); i < nCount; ++i)
+    {
+        const unsigned char* at = source + i * 3;
+        const std::uint32_t nLow = at[detail::LITTLE ? 0 : 2], nMiddle = at[1], nHigh = at[detail::LITTLE ? 2 : 0];
+        Store(destination + i * 4, Widen<7, 16>(nHigh << 16 | nMiddle << 8 | nLow));
+    }
+}
+
+void ReverseBits(const unsigned char* source, unsigned char* destination, std::size_t nBytes)
+{
+    std::size_t i = ReverseVectors(source, destination, nBytes);
+    for (; i + 8 <= nBytes; i += 8)
+        Store(destination + i, ReverseEach(Load<std::uint64_t>(source + i)));
+    for (; i < nBytes; ++i)
+        destination[i] = static_cast<unsigned char>(ReverseEach(source[i]));
+}
+
+void SwapBytes(const unsigned char* source, unsigned char* destination, std::size_t nCount, std::size_t nSampleBytes)
+{
+    switch (nSampleBytes)
+    {
+    case 2:
+        return SwapEach<std::uint16_t>(source, destination, nCount);
+    case 4:
+        return SwapEach<std::uint32_t>(source, destination, nCount);
+    case 8:
+        return SwapEach<std::uint64_t>(source, destination, nCount);
+    default:
+        return SwapOdd(source, destination, nCount, nSampleBytes);
+    }
+}
+
+} // namespace krv::plugins::codec

@@ -1,0 +1,33 @@
+#pragma once
+
+#include <cstddef>
+#include <memory>
+
+namespace krv::plugins::codec
+{
+
+// Deflate in its zlib wrapping. An object keeps its compressor between blocks; one thread at a time.
+class DeflateEncoder
+{
+public:
+    static constexpr int DEFAULT_LEVEL = 6;
+    static constexpr int MAXIMUM_LEVEL = 12;
+
+    // nLevel: 1 (fast) to 12 (small). Throws std::bad_alloc.
+    explicit DeflateEncoder(int nLevel = DEFAULT_LEVEL);
+    ~DeflateEncoder();
+    DeflateEncoder(DeflateEncoder&&) noexcept;
+    DeflateEncoder& operator=(DeflateEncoder&&) noexcept;
+
+    // Room that the code of nInput bytes takes at most.
+    std::size_t GetBound(std::size_t nInput) const;
+
+    // Encodes one block and returns its bytes; nOutput is at least GetBound(nInput).
+    std::size_t Encode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput);
+
+private:
+    struct State;
+    std::unique_ptr<State> mpoState;
+};
+
+} // namespace krv::plugins::codec

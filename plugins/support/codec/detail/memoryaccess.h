@@ -1,0 +1,78 @@
+#pragma once
+
+#include <bit>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+
+namespace krv::plugins::codec::detail
+{
+
+// Words from and to memory of any alignment.
+
+template <typename T>
+inline T Load(const unsigned char* source)
+{
+    T nValue;
+    std::memcpy(&nValue, source, sizeof(T));
+    return nValue;
+}
+
+template <typename T>
+inline void Store(unsigned char* destination, T nValue)
+{
+    std::memcpy(destination, &nValue, sizeof(T));
+}
+
+inline std::uint8_t Swap(std::uint8_t nValue)
+{
+    return nValue;
+}
+inline std::uint16_t Swap(std::uint16_t nValue)
+{
+    return __builtin_bswap16(nValue);
+}
+inline std::uint32_t Swap(std::uint32_t nValue)
+{
+    return __builtin_bswap32(nValue);
+}
+inline std::uint64_t Swap(std::uint64_t nValue)
+{
+    return __builtin_bswap64(nValue);
+}
+
+constexpr bool LITTLE = std::endian::native == std::endian::little;
+
+template <typename T>
+inline T LoadBigEndian(const unsigned char* source)
+{
+    return LITTLE ? Swap(Load<T>(source)) : Load<T>(source);
+}
+
+template <typename T>
+inline T LoadLittleEndian(const unsigned char* source)
+{
+    return LITTLE ? Load<T>(source) : Swap(Load<T>(source));
+}
+
+template <typename T>
+inline void StoreBigEndian(unsigned char* destination, T nValue)
+{
+    Store(destination, LITTLE ? Swap(nValue) : nValue);
+}
+
+template <typename T>
+inline void StoreLittleEndian(unsigned char* destination, T nValue)
+{
+    Store(destination, LITTLE ? nValue : Swap(nValue));
+}
+
+// Sixteen bytes at once. The two places may overlap: all are read before any is written.
+inline void Copy16(unsigned char* destination, const unsigned char* source)
+{
+    unsigned char aBytes[16];
+    std::memcpy(aBytes, source, 16);
+    std::memcpy(destination, aBytes, 16);
+}
+
+} // namespace krv::plugins::codec::detail

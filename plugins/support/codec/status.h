@@ -1,0 +1,30 @@
+#pragma once
+
+#include <cstddef>
+
+namespace krv::plugins::codec
+{
+
+// How the decoding of one block ended.
+enum class Status
+{
+    eDone,      // the output is full; input that would give more was left alone
+    eTruncated, // the input ended, with or without its end mark, before the output was full
+    eCorrupt,   // the input breaks the rules of its coding
+    eNoMemory   // the codec could not get its working memory
+};
+
+// A short English text without full stop, for messages such as "file: tile 7: <text>".
+const char* StatusText(Status oStatus);
+
+// What a decoder gave. The first mnBytes bytes of the output are good whatever the status; bytes behind them are
+// undefined after a failure, and never touched beyond the given size.
+struct Result
+{
+    Status moStatus = Status::eDone;
+    std::size_t mnBytes = 0;
+
+    bool IsDone() const { return moStatus == Status::eDone; }
+};
+
+} // namespace krv::plugins::codec

@@ -1,0 +1,70 @@
+#include "plugins/support/codec/zstddecoder.h"
+
+#include <zstd.h>
+#include <zstd_errors.h>
+
+namespace krv::plugins::codec
+{
+
+struct ZstdDecoder::State
+{
+    ZSTD_DCtx* mpoContext = ZSTD_createDCtx();
+
+    State() = default;
+    State(const State&) = delete;
+    State& operator=(const State&) = delete;
+    ~State() { ZSTD_freeDCtx(mpoContext); }
+};
+
+namespace
+{
+
+Status FromZstd(std::size_t nCode)
+{
+    if (ZSTD_isError(nCode) == 0)
+        return Status::eTruncated;
+    return ZSTD_getErrorCode(nCode) == ZSTD_error_memory_allocation ? Status::eNoMemory : Status::eCorrupt;
+}
+
+// Piece by piece: says how many bytes are good. Goes on after the output is full until nothing moves any more, since
+// the check sum of the frame may follow.
+Result DecodeStream(ZSTD_DCtx* context, const unsigned char* input, std::size_t nInput, unsigned char* output,
+                    std::size_t nOutput)
+{
+    ZSTD_inBuffer oInput{input, nInput, 0};
+    ZSTD_outBuffer oOutput{output, nOutput, 0};
+    ZSTD_DCtx_reset(context, ZSTD_reset_session_only);
+    std::size_t nCode = 1;
+    std::size_t nBefore = nInput + nOutput;
+    while (nCode != 0 && ZSTD_isError(nCode) == 0 && nBefore != oInput.pos + oOutput.pos)
+    {
+        nBefore = oInput.pos + oOutput.pos;
+        nCode = ZSTD_decompressStream(context, &oOutput, &oInput);
+    }
+    const bool bDone = oOutput.pos == nOutput && ZSTD_isError(nCode) == 0;
+    return {bDone ? Status::eDone : FromZstd(nCode), oOutput.pos};
+}
+
+} // namespace
+
+ZstdDecoder::ZstdDecoder() : mpoState(std::make_unique<State>()) {}
+ZstdDecoder::~ZstdDecoder() = default;
+ZstdDecoder::ZstdDecoder(ZstdDecoder&&) noexcept = default;
+ZstdDecoder& ZstdDecoder::operator=(ZstdDecoder&&) noexcept = default;
+
+Result ZstdDecoder::Decode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput)
+{
+    ZSTD_DCtx* context = mpoState->mpoContext;
+    if (context == nullptr)
+        return {Status::eNoMemory, 0};
+    const std::size_t nFrame = ZSTD_findFrameCompressedSize(input, nInput);
+    if (ZSTD_isError(nFrame) == 0)
+    {
+        const std::size_t nBytes = ZSTD_decompressDCtx(context, output, nOutput, input, nFrame);
+        if (nBytes == nOutput)
+            return {Status::eDone, nBytes};
+    }
+    return DecodeStream(context, input, nInput, output, nOutput);
+}
+
+} // namespace krv::plugins::codec

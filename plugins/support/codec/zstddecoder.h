@@ -1,0 +1,29 @@
+#pragma once
+
+#include "plugins/support/codec/status.h"
+
+#include <cstddef>
+#include <memory>
+
+namespace krv::plugins::codec
+{
+
+// Zstandard frames. An object keeps its decompression context between blocks; one thread at a time.
+class ZstdDecoder
+{
+public:
+    ZstdDecoder();
+    ~ZstdDecoder();
+    ZstdDecoder(ZstdDecoder&&) noexcept;
+    ZstdDecoder& operator=(ZstdDecoder&&) noexcept;
+
+    // Decodes one block into at most nOutput bytes. A stream that would give more fills the output and counts as done.
+    // Bytes behind the first frame are ignored.
+    Result Decode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput);
+
+private:
+    struct State;
+    std::unique_ptr<State> mpoState;
+};
+
+} // namespace krv::plugins::codec

@@ -1,0 +1,178 @@
+#include "plugins/support/dataset.h"
+
+#include "datasources/metadata/auxiliarydata.h"
+#include "gobs/raster/rasterinfo.h"
+#include "plugins/support/rasterio.h"
+#include "plugins/support/storedchannelinfo.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <cerrno>
+#include <cstdio>
+
+#include <sys/stat.h>
+
+namespace krv::plugins::support
+{
+
+namespace
+{
+
+std::uint64_t ThreeBlockRows(const ImageLayout& oLayout)
+{
+    std::uint64_t nPixelBytes = 0;
+    for (unsigned int nPlane = 0; nPlane < oLayout.GetPlaneCount(); ++nPlane)
+        nPixelBytes += oLayout.GetPixelBytes(nPlane);
+    const std::uint64_t nRowPixels = std::uint64_t{oLayout.GetWidth()} * oLayout.GetBlockHeight();
+    if (nRowPixels > BlockCache::MAXIMUM_BOUND || nPixelBytes > BlockCache::MAXIMUM_BOUND)
+        return BlockCache::MAXIMUM_BOUND;
+    return 3 * nRowPixels * nPixelBytes;
+}
+
+} // namespace
+
+Dataset::Dataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat)
+    : moName(fileName), mpoFormat(poFormat), mpoCache(std::make_shared<BlockCache>())
+{
+}
+
+Dataset::~Dataset() = default;
+
+void Dataset::SetImage(std::unique_ptr<IBlockSource> poSource)
+{
+    mpoCache->Reserve(ThreeBlockRows(poSource->GetLayout()));
+    mpoImage = std::make_shared<BlockImage>(std::move(poSource), mpoCache);
+}
+
+void Dataset::Refuse(const std::string& what, const Place& oPlace) const
+{
+    throw DataException(moName + ": " + what, oPlace);
+}
+
+void Dataset::CheckOpen(const Place& oPlace) const
+{
+    if (!mbOpen)
+        Refuse("the dataset is closed", oPlace);
+}
+
+const std::shared_ptr<BlockImage>& Dataset::GetImage(const Place& oPlace) const
+{
+    CheckOpen(oPlace);
+    if (!mpoImage)
+        Refuse("the dataset has no image yet", oPlace);
+    return mpoImage;
+}
+
+const ImageLayout& Dataset::GetLayout(const Place& oPlace) const
+{
+    return GetImage(oPlace)->GetLayout();
+}
+
+krv::datasources::FileAccessState Dataset::Delete()
+{
+    Close();
+    if (std::remove(moName.c_str()) == 0)
+        return krv::datasources::eDone;
+    return errno == ENOENT ? krv::datasources::eNotFound : krv::datasources::eDenied;
+}
+
+bool Dataset::Exists() const
+{
+    struct stat oStatus = {};
+    return ::stat(moName.c_str(), &oStatus) == 0;
+}
+
+krv::datasources::AuxiliaryData Dataset::ReadAuxiliaryData()
+{
+    return krv::datasources::AuxiliaryData(GetChanCount());
+}
+
+void Dataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData&)
+{
+    Refuse("metadata cannot be written");
+}
+
+krv::ogc::cs::ICRS* Dataset::ReadCRS() const
+{
+    return nullptr;
+}
+
+void Dataset::UpdateCRS(const krv::ogc::cs::ICRS&) const
+{
+    Refuse("the reference system cannot be written");
+}
+
+bool Dataset::IsLinked() const
+{
+    return false;
+}
+
+void Dataset::Synchronize() {}
+
+void Dataset::Close()
+{
+    mbOpen = false;
+    mpoImage.reset();
+}
+
+krv::datasources::IRasterIO* Dataset::GetRasterIO(const std::vector<unsigned int>& oChannels)
+{
+    return new RasterIO(GetImage(), oChannels);
+}
+
+void Dataset::AddNewChannel(const krv::gobs::RasterInfo&)
+{
+    Refuse("channels cannot be added");
+}
+
+void Dataset::DeleteChannel(unsigned int)
+{
+    Refuse("channels cannot be deleted");
+}
+
+void Dataset::Create(unsigned int, unsigned int, const std::vector<krv::gobs::DataType>&)
+{
+    Refuse("an image cannot be laid out");
+}
+
+void Dataset::Create(const krv::gobs::RasterInfo& oInfo)
+{
+    Create(oInfo.GetWidth(), oInfo.GetHeight(),
+           std::vector<krv::gobs::DataType>(oInfo.GetChansCount(), oInfo.GetDataType()));
+}
+
+unsigned int Dataset::GetWidth() const
+{
+    return GetLayout().GetWidth();
+}
+
+unsigned int Dataset::GetHeight() const
+{
+    return GetLayout().GetHeight();
+}
+
+unsigned int Dataset::GetChanCount() const
+{
+    return GetLayout().GetChannelCount();
+}
+
+krv::datasources::IChannelInfo* Dataset::GetChannelInfo(unsigned int nChannel) const
+{
+    return new StoredChannelInfo(GetLayout().GetChannelPlane(nChannel));
+}
+
+krv::datasources::IHistoryIO* Dataset::GetHistoryIO(unsigned int)
+{
+    return nullptr;
+}
+
+krv::datasources::IOverviewManager* Dataset::GetOverviewManager()
+{
+    return nullptr;
+}
+
+krv::datasources::AccessCapabilities Dataset::GetRasterCapabilities()
+{
+    return {true, false, false};
+}
+
+} // namespace krv::plugins::support

@@ -1,0 +1,79 @@
+#pragma once
+
+#include "plugins/support/scratch.h"
+#include "toolkit/exceptions/place.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <source_location>
+#include <string>
+
+namespace krv::plugins::support
+{
+
+// An open file that is read and written at given offsets, without mapping and without a position of its own. Every
+// failure is an exception that names the file and the cause, a file that became shorter meanwhile included. A file may
+// be read by several threads.
+class File
+{
+public:
+    enum class Mode
+    {
+        eRead,   // an existing file
+        eUpdate, // an existing file, to be written too
+        eCreate  // a new or emptied file
+    };
+
+    // Throws FileNotFoundException when there is no such file, IOException when it cannot be opened or is no plain
+    // file.
+    File(const std::string& fileName, Mode eMode, const Place& oPlace = Place::Current());
+    ~File();
+    File(const File&) = delete;
+    File& operator=(const File&) = delete;
+
+    // What transfers take in place of a Place, which costs memory and is made only when something is thrown.
+    using Location = std::source_location;
+
+    const std::string& GetName() const { return moName; }
+    // The size at the moment of opening; writing beyond the end raises it.
+    std::uint64_t GetSize() const { return mnSize; }
+
+    // Reads exactly nBytes. Throws IOException when the file ends before.
+    void Read(std::uint64_t nOffset, void* pTarget, std::size_t nBytes, Location oLocation = Location::current()) const;
+
+    // Reads up to nBytes and returns how many there were: fewer only at the end of the file.
+    std::size_t ReadUpTo(std::uint64_t nOffset, void* pTarget, std::size_t nBytes,
+                         Location oLocation = Location::current()) const;
+
+    // Reads nRows rows of nRowBytes that lie nStoredPitch bytes apart in the file, into rows nPitch bytes apart, with
+    // as few calls to the system as pays; what lies between the rows of the target stays untouched.
+    void ReadRows(std::uint64_t nOffset, std::size_t nStoredPitch, std::size_t nRowBytes, std::size_t nRows,
+                  unsigned char* pTarget, std::size_t nPitch, Scratch& oScratch,
+                  Location oLocation = Location::current()) const;
+
+    void Write(std::uint64_t nOffset, const void* pSource, std::size_t nBytes,
+               Location oLocation = Location::current());
+    void WriteRows(std::uint64_t nOffset, std::size_t nStoredPitch, std::size_t nRowBytes, std::size_t nRows,
+                   const unsigned char* pSource, std::size_t nPitch, Location oLocation = Location::current());
+
+    // Makes sure that what was written reaches the disk.
+    void Flush(const Place& oPlace = Place::Current());
+
+    // From now on messages, and GetName, name the file otherwise.
+    void ShowAs(const std::string& fileName) { moName = fileName; }
+
+    // Gives the file another name in the same file system, replacing a file of that name, and makes sure that the name
+    // reaches the disk.
+    void Rename(const std::string& fileName, const Place& oPlace = Place::Current());
+
+private:
+    std::string moName;
+    std::string moPath;
+    int mnDescriptor = -1;
+    std::uint64_t mnSize = 0;
+};
+
+// The text of an error number, in the C locale.
+std::string SystemErrorText(int nError);
+
+} // namespace krv::plugins::support

@@ -1,0 +1,98 @@
+#pragma once
+
+#include "gobs/raster/datatype.h"
+#include "toolkit/exceptions/place.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <vector>
+
+namespace krv::plugins::support
+{
+
+// Channels that a block holds together, pixel interleaved, all of one type. Pixel-interleaved files have one plane of
+// all channels, band-interleaved ones a plane for every channel.
+struct Plane
+{
+    // The type of the values that are handed out: one of the table, in this machine's byte order.
+    krv::gobs::DataType moType;
+    unsigned int mnChannels = 1;
+    // The type as the file stores it; no type (the default) means the same.
+    krv::gobs::DataType moNativeType;
+};
+
+// A rectangle of pixels inside an image or a block.
+struct PixelRect
+{
+    unsigned int mnX = 0;
+    unsigned int mnY = 0;
+    unsigned int mnWidth = 0;
+    unsigned int mnHeight = 0;
+
+    friend bool operator==(const PixelRect&, const PixelRect&) = default;
+};
+
+// Where a channel lies: its plane, and its position among the plane's channels, both from 0.
+struct ChannelPlace
+{
+    unsigned int mnPlane = 0;
+    unsigned int mnPosition = 0;
+
+    friend bool operator==(const ChannelPlace&, const ChannelPlace&) = default;
+};
+
+// The geometry of an image: its size, the grid of its blocks, which is the same for all planes, and its planes. Blocks
+// count from 0, row by row; those at the right and bottom edge may reach beyond the image.
+class ImageLayout
+{
+public:
+    // Throws DataException for a size of 0 or above 2^31 - 1, for no planes, and for a type outside the table.
+    ImageLayout(unsigned int nWidth, unsigned int nHeight, unsigned int nBlockWidth, unsigned int nBlockHeight,
+                std::vector<Plane> oPlanes, const Place& oPlace = Place::Current());
+
+    unsigned int GetWidth() const { return mnWidth; }
+    unsigned int GetHeight() const { return mnHeight; }
+    unsigned int GetBlockWidth() const { return mnBlockWidth; }
+    unsigned int GetBlockHeight() const { return mnBlockHeight; }
+    unsigned int GetBlocksAcross() const { return mnBlocksAcross; }
+    unsigned int GetBlocksDown() const { return mnBlocksDown; }
+
+    // The size that readers are told to use; the block's unless set.
+    void SetPreferredBlock(unsigned int nWidth, unsigned int nHeight);
+    unsigned int GetPreferredWidth() const { return mnPreferredWidth; }
+    unsigned int GetPreferredHeight() const { return mnPreferredHeight; }
+
+    unsigned int GetPlaneCount() const { return static_cast<unsigned int>(moPlanes.size()); }
+    const Plane& GetPlane(unsigned int nPlane) const { return moPlanes[nPlane]; }
+    unsigned int GetChannelCount() const { return moFirstChannels.back(); }
+
+    // A channel counts from 1. Throw DataException for one that does not exist.
+    ChannelPlace GetChannelPlace(unsigned int nChannel, const Place& oPlace = Place::Current()) const;
+    const Plane& GetChannelPlane(unsigned int nChannel, const Place& oPlace = Place::Current()) const;
+
+    // Bytes of one value, and of all values of one pixel of a plane, as handed out.
+    static std::size_t GetValueBytes(const krv::gobs::DataType& oType) { return oType.GetValueBits() / 8; }
+    std::size_t GetPixelBytes(unsigned int nPlane) const { return maPixelBytes[nPlane]; }
+
+    // The part of a block that lies in the image, in image coordinates.
+    PixelRect GetBlockRect(unsigned int nColumn, unsigned int nRow) const;
+    std::uint64_t GetBlockIndex(unsigned int nColumn, unsigned int nRow) const
+    {
+        return static_cast<std::uint64_t>(nRow) * mnBlocksAcross + nColumn;
+    }
+
+private:
+    unsigned int mnWidth;
+    unsigned int mnHeight;
+    unsigned int mnBlockWidth;
+    unsigned int mnBlockHeight;
+    unsigned int mnPreferredWidth;
+    unsigned int mnPreferredHeight;
+    unsigned int mnBlocksAcross;
+    unsigned int mnBlocksDown;
+    std::vector<Plane> moPlanes;
+    std::vector<unsigned int> moFirstChannels; // of each plane, and the count of all at the end
+    std::vector<std::size_t> maPixelBytes;
+};
+
+} // namespace krv::plugins::support

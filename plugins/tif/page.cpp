@@ -1,0 +1,273 @@
+#include "plugins/tif/page.h"
+
+#include "toolkit/exceptions/exceptions.h"
+
+#include <algorithm>
+#include <climits>
+
+namespace krv::plugins::tif
+{
+
+namespace
+{
+
+// All tags of a directory together, those of strips and tiles excepted, which are read piece by piece.
+constexpr std::uint64_t MAXIMUM_TAG_BYTES = std::uint64_t{96} << 20;
+// Even a single row of a strip is handled as a whole.
+constexpr std::uint64_t MAXIMUM_ROW_BYTES = std::uint64_t{96} << 20;
+
+std::uint32_t DivideUp(std::uint32_t nSize, std::uint32_t nPart)
+{
+    return (nSize - 1) / nPart + 1;
+}
+
+template <typename T>
+T GetTag(TIFF* poTiff, std::uint32_t nTag, T nDefault)
+{
+    T nValue = nDefault;
+    return TIFFGetFieldDefaulted(poTiff, nTag, &nValue) == 1 ? nValue : nDefault;
+}
+
+bool IsStrileTag(std::uint16_t nTag)
+{
+    return nTag == TIFFTAG_STRIPOFFSETS || nTag == TIFFTAG_STRIPBYTECOUNTS || nTag == TIFFTAG_TILEOFFSETS ||
+           nTag == TIFFTAG_TILEBYTECOUNTS;
+}
+
+std::string CodecName(std::uint16_t nCompression)
+{
+    const TIFFCodec* poCodec = TIFFFindCODEC(nCompression);
+    const std::string number = std::to_string(nCompression);
+    return poCodec != nullptr ? std::string(poCodec->name) + " (" + number + ")" : number;
+}
+
+// The tag belongs to these codecs alone; for others libtiff's answer is undefined.
+bool HasPredictor(std::uint16_t nCompression)
+{
+    return nCompression == COMPRESSION_LZW || nCompression == COMPRESSION_DEFLATE ||
+           nCompression == COMPRESSION_ADOBE_DEFLATE || nCompression == COMPRESSION_ZSTD ||
+           nCompression == COMPRESSION_LZMA;
+}
+
+// Codecs that know one width of sample only; what libtiff makes of others is undefined.
+bool FitsCodec(std::uint16_t nCompression, unsigned int nBits, unsigned int nPlaneChannels)
+{
+    switch (nCompression)
+    {
+    case COMPRESSION_CCITTRLE:
+    case COMPRESSION_CCITTRLEW:
+    case COMPRESSION_CCITTFAX3:
+    case COMPRESSION_CCITTFAX4:
+    case COMPRESSION_JBIG:
+        return nBits == 1 && nPlaneChannels == 1;
+    case COMPRESSION_THUNDERSCAN:
+        return nBits == 4 && nPlaneChannels == 1;
+    case COMPRESSION_NEXT:
+        return nBits == 2 && nPlaneChannels == 1;
+    case COMPRESSION_JPEG:
+    case COMPRESSION_WEBP:
+        return nBits == 8;
+    case COMPRESSION_PIXARLOG:
+        return nBits == 8 || nBits == 16 || nBits == 32;
+    default:
+        return true;
+    }
+}
+
+} // namespace
+
+std::uint32_t PageForm::GetStrileRows(std::uint32_t nStrileRow) const
+{
+    return mbTiled ? mnStrileHeight : std::min(mnStrileHeight, mnHeight - nStrileRow * mnStrileHeight);
+}
+
+bool PageForm::IsOwnCodec() const
+{
+    switch (mnCompression)
+    {
+    case COMPRESSION_NONE:
+    case COMPRESSION_LZW:
+    case COMPRESSION_ZSTD:
+    case COMPRESSION_DEFLATE:
+    case COMPRESSION_ADOBE_DEFLATE:
+        return !mbReversedBits;
+    default:
+        return false;
+    }
+}
+
+int PageForm::GetAlphaChannel() const
+{
+    for (std::size_t nAt = 0; nAt < moExtraSamples.size(); ++nAt)
+        if (moExtraSamples[nAt] == EXTRASAMPLE_ASSOCALPHA || moExtraSamples[nAt] == EXTRASAMPLE_UNASSALPHA)
+            return static_cast<int>(mnChannels - moExtraSamples.size() + nAt);
+    return -1;
+}
+
+bool PageForm::IsPremultiplied() const
+{
+    const int nChannel = GetAlphaChannel();
+    return nChannel >= 0 && moExtraSamples[static_cast<std::size_t>(nChannel) - (mnChannels - moExtraSamples.size())] ==
+                                EXTRASAMPLE_ASSOCALPHA;
+}
+
+Page::Page(std::shared_ptr<const support::File> poFile, const FileHeader& oHeader, std::uint64_t nDirectory)
+    : mpoFile(std::move(poFile)), moHeader(oHeader), moReader(*mpoFile), moDirectory(moReader, oHeader, nDirectory),
+      moHandle((CheckTagSizes(), moReader), oHeader, nDirectory)
+{
+    ReadForm();
+    ReadGeometry();
+    CheckCodec();
+    CheckPhotometric();
+    CheckSizes();
+    mpoStriles = std::make_unique<StrileTable>(*mpoFile, moDirectory, oHeader.mbBigEndian, moForm.GetStriles());
+}
+
+Page::~Page() = default;
+
+void Page::Fail(const std::string& what, const Place& oPlace) const
+{
+    throw FileFormatException(GetFileName(), GetFileName() + ": " + what, oPlace);
+}
+
+// libtiff reads every tag at once and bounds each alone only.
+void Page::CheckTagSizes() const
+{
+    std::uint64_t nSum = 0;
+    for (const DirectoryEntry& oEntry : moDirectory.GetEntries())
+        if (!IsStrileTag(oEntry.mnTag))
+        {
+            if (oEntry.GetBytes() > MAXIMUM_TAG_BYTES)
+                Fail("tag " + std::to_string(oEntry.mnTag) + " claims " + std::to_string(oEntry.mnCount) + " values");
+            nSum += oEntry.GetBytes();
+        }
+    if (nSum > MAXIMUM_TAG_BYTES)
+        Fail("the tags claim " + std::to_string(nSum) + " bytes");
+}
+
+void Page::ReadForm()
+{
+    TIFF* poTiff = GetTiff();
+    moForm.mbBigEndian = moHeader.mbBigEndian;
+    moForm.mnChannels = GetTag<std::uint16_t>(poTiff, TIFFTAG_SAMPLESPERPIXEL, 1);
+    moForm.mbSeparate = moForm.mnChannels > 1 && GetTag<std::uint16_t>(poTiff, TIFFTAG_PLANARCONFIG,
+                                                                       PLANARCONFIG_CONTIG) == PLANARCONFIG_SEPARATE;
+    moForm.mbReversedBits = GetTag<std::uint16_t>(poTiff, TIFFTAG_FILLORDER, FILLORDER_MSB2LSB) == FILLORDER_LSB2MSB;
+    moForm.mnCompression = GetTag<std::uint16_t>(poTiff, TIFFTAG_COMPRESSION, COMPRESSION_NONE);
+    if (HasPredictor(moForm.mnCompression))
+        moForm.mnPredictor = GetTag<std::uint16_t>(poTiff, TIFFTAG_PREDICTOR, PREDICTOR_NONE);
+    moForm.mnPhotometric = GetTag<std::uint16_t>(poTiff, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
+    std::uint16_t nExtra = 0;
+    std::uint16_t* pExtra = nullptr;
+    if (TIFFGetField(poTiff, TIFFTAG_EXTRASAMPLES, &nExtra, &pExtra) == 1 && nExtra <= moForm.mnChannels)
+        moForm.moExtraSamples.assign(pExtra, pExtra + nExtra);
+    if (moForm.mnChannels == 0)
+        Fail("the image has no channels");
+    std::string reason;
+    if (!FindSampleForm(GetTag<std::uint16_t>(poTiff, TIFFTAG_BITSPERSAMPLE, 1),
+                        GetTag<std::uint16_t>(poTiff, TIFFTAG_SAMPLEFORMAT, SAMPLEFORMAT_UINT), moForm.moSample,
+                        reason))
+        Fail(reason);
+}
+
+void Page::ReadGeometry()
+{
+    TIFF* poTiff = GetTiff();
+    moForm.mnWidth = GetTag<std::uint32_t>(poTiff, TIFFTAG_IMAGEWIDTH, 0);
+    moForm.mnHeight = GetTag<std::uint32_t>(poTiff, TIFFTAG_IMAGELENGTH, 0);
+    moForm.mbTiled = TIFFIsTiled(poTiff) != 0;
+    if (moForm.mnWidth == 0 || moForm.mnHeight == 0 || moForm.mnWidth > INT_MAX || moForm.mnHeight > INT_MAX)
+        Fail("the image size " + std::to_string(moForm.mnWidth) + " x " + std::to_string(moForm.mnHeight) +
+             " is out of range");
+    if (GetTag<std::uint32_t>(poTiff, TIFFTAG_IMAGEDEPTH, 1) > 1 ||
+        GetTag<std::uint32_t>(poTiff, TIFFTAG_TILEDEPTH, 1) > 1)
+        Fail("volumes (image depth above 1) cannot be read");
+    if (moForm.mbTiled)
+    {
+        moForm.mnStrileWidth = GetTag<std::uint32_t>(poTiff, TIFFTAG_TILEWIDTH, 0);
+        moForm.mnStrileHeight = GetTag<std::uint32_t>(poTiff, TIFFTAG_TILELENGTH, 0);
+    }
+    else
+    {
+        moForm.mnStrileWidth = moForm.mnWidth;
+        moForm.mnStrileHeight =
+            std::min(moForm.mnHeight, GetTag<std::uint32_t>(poTiff, TIFFTAG_ROWSPERSTRIP, UINT32_MAX));
+    }
+    if (moForm.mnStrileWidth == 0 || moForm.mnStrileHeight == 0 || moForm.mnStrileWidth > INT_MAX ||
+        moForm.mnStrileHeight > INT_MAX)
+        Fail("the size of its strips or tiles, " + std::to_string(moForm.mnStrileWidth) + " x " +
+             std::to_string(moForm.mnStrileHeight) + ", is out of range");
+    moForm.mnStrilesAcross = DivideUp(moForm.mnWidth, moForm.mnStrileWidth);
+    moForm.mnStrilesDown = DivideUp(moForm.mnHeight, moForm.mnStrileHeight);
+}
+
+void Page::CheckCodec()
+{
+    const std::uint16_t nCompression = moForm.mnCompression;
+    const SampleForm& oSample = moForm.moSample;
+    if (nCompression == COMPRESSION_OJPEG)
+        Fail("old-style JPEG compression cannot be read correctly");
+    if (TIFFIsCODECConfigured(nCompression) == 0)
+        Fail("the compression " + CodecName(nCompression) + " is not supported");
+    if (!FitsCodec(nCompression, oSample.GetBits(), moForm.GetPlaneChannels()))
+        Fail("the compression " + CodecName(nCompression) + " does not go with samples of " +
+             std::to_string(oSample.GetBits()) + " bits and " + std::to_string(moForm.GetPlaneChannels()) +
+             " channels");
+    if (HasPredictor(nCompression))
+        CheckPredictor();
+    // The library turns samples round as a whole where their parts are meant.
+    const bool bOddParts = oSample.mnParts == 2 && (oSample.mnPartBits <= 12 || oSample.meWidening == Widening::eHalf);
+    if (bOddParts && moForm.mbBigEndian && oSample.GetBits() % 8 == 0 && !moForm.IsOwnCodec())
+        Fail("big-endian complex samples of " + std::to_string(oSample.GetBits()) +
+             " bits in this compression cannot be read correctly");
+}
+
+void Page::CheckPredictor() const
+{
+    const SampleForm& oSample = moForm.moSample;
+    const bool bWord =
+        oSample.GetBits() == 8 || oSample.GetBits() == 16 || oSample.GetBits() == 32 || oSample.GetBits() == 64;
+    const bool bReal = oSample.moNativeType.IsReal() && oSample.mnParts == 1;
+    const bool bKnown = moForm.mnPredictor == PREDICTOR_NONE || (moForm.mnPredictor == PREDICTOR_HORIZONTAL && bWord) ||
+                        (moForm.mnPredictor == PREDICTOR_FLOATINGPOINT && bReal);
+    if (!bKnown)
+        Fail("predictor " + std::to_string(moForm.mnPredictor) + " does not go with samples of " +
+             std::to_string(oSample.GetBits()) + " bits of this kind");
+}
+
+void Page::CheckPhotometric()
+{
+    switch (moForm.mnPhotometric)
+    {
+    case PHOTOMETRIC_LOGL:
+    case PHOTOMETRIC_LOGLUV:
+        Fail("logarithmic luminance (LogL, LogLuv) cannot be read correctly");
+    case PHOTOMETRIC_YCBCR:
+        if (moForm.mnCompression != COMPRESSION_JPEG || moForm.mbSeparate || moForm.mnChannels != 3)
+            Fail("YCbCr pixels can be read only when they are compressed by JPEG and pixel interleaved");
+        TIFFSetField(GetTiff(), TIFFTAG_JPEGCOLORMODE, JPEGCOLORMODE_RGB);
+        break;
+    default:
+        break;
+    }
+}
+
+void Page::CheckSizes() const
+{
+    // The smallest part that is handled as a whole: a tile, or a row of a strip.
+    const std::uint64_t nRow =
+        std::max(moForm.GetRowBytes(moForm.mnStrileWidth), moForm.GetStoredRowBytes(moForm.mnStrileWidth));
+    if (nRow > MAXIMUM_ROW_BYTES)
+        Fail("a row of " + std::to_string(nRow) + " bytes is too long");
+    if (moForm.GetStriles() > UINT32_MAX)
+        Fail("there are too many strips or tiles");
+    if (moForm.mnCompression == COMPRESSION_NONE)
+        return;
+    const std::uint64_t nExpected = moForm.GetStoredRowBytes(moForm.mnStrileWidth);
+    const auto nClaimed = moForm.mbTiled ? TIFFTileRowSize64(GetTiff()) : TIFFScanlineSize64(GetTiff());
+    if (nClaimed != nExpected)
+        Fail("rows of " + std::to_string(nClaimed) + " bytes instead of " + std::to_string(nExpected) +
+             " cannot be read correctly");
+}
+
+} // namespace krv::plugins::tif

@@ -1,0 +1,102 @@
+#pragma once
+
+#include "plugins/support/file.h"
+#include "plugins/tif/peekreader.h"
+#include "plugins/tif/rawdirectory.h"
+#include "plugins/tif/sampleform.h"
+#include "plugins/tif/striletable.h"
+#include "plugins/tif/tiffhandle.h"
+
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace krv::plugins::tif
+{
+
+// What of the tags of a page decides how its pixels are read.
+struct PageForm
+{
+    std::uint32_t mnWidth = 0;
+    std::uint32_t mnHeight = 0;
+    std::uint16_t mnChannels = 1;
+    SampleForm moSample;
+    bool mbBigEndian = false;
+    bool mbSeparate = false; // every channel in strips or tiles of its own
+    bool mbTiled = false;
+    bool mbReversedBits = false; // the lowest bit of a byte comes first
+    std::uint16_t mnCompression = 1;
+    std::uint16_t mnPredictor = 1;
+    std::uint16_t mnPhotometric = 1;
+    std::vector<std::uint16_t> moExtraSamples;
+    // A tile, or a strip: as wide as the image, its height at most the image's.
+    std::uint32_t mnStrileWidth = 0;
+    std::uint32_t mnStrileHeight = 0;
+    std::uint32_t mnStrilesAcross = 0;
+    std::uint32_t mnStrilesDown = 0;
+
+    // Channels that lie together in a strip or tile.
+    unsigned int GetPlaneChannels() const { return mbSeparate ? 1u : mnChannels; }
+    unsigned int GetPlanes() const { return mbSeparate ? mnChannels : 1u; }
+    std::uint64_t GetStriles() const { return std::uint64_t{mnStrilesAcross} * mnStrilesDown * GetPlanes(); }
+    // Bytes of a stored row of nPixels, and of the same row as handed out.
+    std::uint64_t GetStoredRowBytes(std::uint64_t nPixels) const
+    {
+        return (nPixels * GetPlaneChannels() * moSample.GetBits() + 7) / 8;
+    }
+    std::uint64_t GetRowBytes(std::uint64_t nPixels) const
+    {
+        return nPixels * GetPlaneChannels() * moSample.GetValueBytes();
+    }
+    // The rows that a strip or tile in a row of them holds: strips end with the image, tiles do not.
+    std::uint32_t GetStrileRows(std::uint32_t nStrileRow) const;
+    // Whether the samples come as they are stored, not by way of libtiff's decoders.
+    bool IsOwnCodec() const;
+    // The channel (from 0) that holds alpha: extra samples 1 and 2; -1 when there is none.
+    int GetAlphaChannel() const;
+    bool IsPremultiplied() const;
+};
+
+// One directory of the file with everything that reading it takes. Throws FileFormatException naming file and cause for
+// what is damaged and for what cannot be read correctly.
+class Page
+{
+public:
+    Page(std::shared_ptr<const support::File> poFile, const FileHeader& oHeader, std::uint64_t nDirectory);
+    ~Page();
+    Page(const Page&) = delete;
+    Page& operator=(const Page&) = delete;
+
+    const support::File& GetFile() const { return *mpoFile; }
+    const std::string& GetFileName() const { return mpoFile->GetName(); }
+    const FileHeader& GetHeader() const { return moHeader; }
+    const PageForm& GetForm() const { return moForm; }
+    const RawDirectory& GetDirectory() const { return moDirectory; }
+    PeekReader& GetReader() { return moReader; }
+    TIFF* GetTiff() const { return moHandle.Get(); }
+    TiffHandle& GetHandle() { return moHandle; }
+    StrileTable& GetStriles() { return *mpoStriles; }
+
+    // Throws FileFormatException "<file>: <what>".
+    [[noreturn]] void Fail(const std::string& what, const Place& oPlace = Place::Current()) const;
+
+private:
+    void CheckTagSizes() const;
+    void ReadForm();
+    void ReadGeometry();
+    void CheckCodec();
+    void CheckPredictor() const;
+    void CheckPhotometric();
+    void CheckSizes() const;
+
+    std::shared_ptr<const support::File> mpoFile;
+    FileHeader moHeader;
+    PeekReader moReader;
+    RawDirectory moDirectory;
+    TiffHandle moHandle;
+    PageForm moForm;
+    std::unique_ptr<StrileTable> mpoStriles;
+};
+
+} // namespace krv::plugins::tif

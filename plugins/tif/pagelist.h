@@ -1,0 +1,57 @@
+#pragma once
+
+#include "plugins/tif/rawdirectory.h"
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+namespace krv::plugins::tif
+{
+
+// A directory as far as its role in the file goes.
+struct PageSummary
+{
+    std::uint64_t mnOffset = 0;
+    std::uint64_t mnWidth = 0;
+    std::uint64_t mnHeight = 0;
+    std::uint64_t mnChannels = 1;
+    std::uint64_t mnBits = 1;
+    std::uint64_t mnFormat = 1;
+    bool mbReduced = false;
+    bool mbMask = false;
+    bool mbDescribed = false; // has an image description
+    // Of a level its reduction factor, of a bitmap its number, where its name says so; else 0.
+    unsigned int mnNumber = 0;
+};
+
+// The name (tag 285) by which levels and bitmaps made here keep their numbers.
+std::string MakePageName(unsigned int nNumber, bool bLevel);
+// 0 for another name.
+unsigned int ParsePageName(const std::string& name, bool bLevel);
+
+// All pages of a file, the first one first: the main chain, then the directories that the first page lists below itself
+// (what further hangs on those is left alone). Throws FileFormatException for a damaged directory, a chain that runs in
+// a circle, and more than MAXIMUM_PAGES.
+std::vector<PageSummary> ListPages(PeekReader& oReader, const FileHeader& oHeader);
+
+constexpr std::size_t MAXIMUM_PAGES = 65535;
+
+// A reduced page of a full-size one.
+struct PageLevel
+{
+    unsigned int mnLevel = 0; // its reduction factor
+    PageSummary moPage;
+};
+
+// The levels of the first page, ascending: reduced pages of the same channels and type, not masks. The number of a
+// level is the one that its name gives, else the ratio of the widths, rounded, at least 2; of two pages with one
+// number the larger counts.
+std::vector<PageLevel> FindLevels(const std::vector<PageSummary>& oPages);
+
+// Full-size masks of one channel of 1 or 8 bits, in the order of the file, and the reduced masks that go with them.
+// Each mask gets the number that its name gives; those without get the smallest that are left.
+std::vector<PageSummary> FindMasks(const std::vector<PageSummary>& oPages);
+std::vector<PageLevel> FindMaskLevels(const std::vector<PageSummary>& oPages);
+
+} // namespace krv::plugins::tif

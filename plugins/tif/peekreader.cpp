@@ -1,0 +1,32 @@
+#include "plugins/tif/peekreader.h"
+
+#include <algorithm>
+#include <cstring>
+
+namespace krv::plugins::tif
+{
+
+std::size_t PeekReader::Read(std::uint64_t nOffset, void* pTarget, std::size_t nBytes)
+{
+    if (nBytes == 0)
+        return 0;
+    for (const Window& oWindow : maWindows)
+        if (oWindow.Holds(nOffset, nBytes))
+        {
+            std::memcpy(pTarget, oWindow.maBytes.data() + (nOffset - oWindow.mnOffset), nBytes);
+            return nBytes;
+        }
+    if (nBytes > WINDOW_BYTES / 2)
+        return moFile.ReadUpTo(nOffset, pTarget, nBytes);
+    Window& oWindow = maWindows[mnNext];
+    mnNext = 1 - mnNext;
+    oWindow.mnBytes = 0;
+    oWindow.mnOffset = nOffset - nOffset % (WINDOW_BYTES / 4);
+    oWindow.mnBytes = moFile.ReadUpTo(oWindow.mnOffset, oWindow.maBytes.data(), WINDOW_BYTES);
+    const std::size_t nSkip = nOffset - oWindow.mnOffset;
+    const std::size_t nGot = std::min(nBytes, oWindow.mnBytes > nSkip ? oWindow.mnBytes - nSkip : 0);
+    std::memcpy(pTarget, oWindow.maBytes.data() + nSkip, nGot);
+    return nGot;
+}
+
+} // namespace krv::plugins::tif

@@ -1,0 +1,172 @@
+#include "plugins/tif/striledecoder.h"
+
+#include "plugins/support/codec/bits.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <bit>
+#include <cstring>
+
+namespace krv::plugins::tif
+{
+
+namespace
+{
+
+constexpr std::size_t KEPT_SCRATCH_BYTES = std::size_t{4} << 20;
+constexpr bool BIG_ENDIAN_MACHINE = std::endian::native == std::endian::big;
+
+void CopyRows(const unsigned char* pSource, std::size_t nSourcePitch, const WantedPixels& oWanted, std::size_t nBytes)
+{
+    if (pSource == oWanted.mpTarget)
+        return;
+    for (std::uint32_t nRow = 0; nRow < oWanted.mnRows; ++nRow)
+        std::memcpy(oWanted.mpTarget + nRow * oWanted.mnPitch, pSource + nRow * nSourcePitch, nBytes);
+}
+
+} // namespace
+
+StrileDecoder::StrileDecoder(Page& oPage) : moPage(oPage), moForm(oPage.GetForm()) {}
+
+std::string StrileDecoder::Describe(std::uint32_t nStrile) const
+{
+    return (moForm.mbTiled ? "tile " : "strip ") + std::to_string(nStrile);
+}
+
+void StrileDecoder::Relax()
+{
+    moScratch.Shrink(KEPT_SCRATCH_BYTES);
+}
+
+codec::SampleOrder StrileDecoder::GetOrder() const
+{
+    return moForm.mbBigEndian == BIG_ENDIAN_MACHINE ? codec::SampleOrder::eNative : codec::SampleOrder::eSwapped;
+}
+
+codec::Result StrileDecoder::DecodeOwn(const unsigned char* pRaw, std::size_t nRaw, unsigned char* pTarget,
+                                       std::size_t nBytes)
+{
+    switch (moForm.mnCompression)
+    {
+    case COMPRESSION_LZW:
+        return moLzw.Decode(pRaw, nRaw, pTarget, nBytes);
+    case COMPRESSION_ZSTD:
+        return moZstd.Decode(pRaw, nRaw, pTarget, nBytes);
+    default:
+        return moDeflate.Decode(pRaw, nRaw, pTarget, nBytes);
+    }
+}
+
+// The library behind JBIG ends the process when the size in a stream asks for more memory than there is.
+void StrileDecoder::CheckStream(std::uint32_t nStrile, const unsigned char* pRaw, std::size_t nRaw) const
+{
+    constexpr std::size_t HEADER_BYTES = 20;
+    if (moForm.mnCompression != COMPRESSION_JBIG)
+        return;
+    unsigned char aHeader[HEADER_BYTES] = {};
+    std::memcpy(aHeader, pRaw, std::min(nRaw, HEADER_BYTES));
+    // libtiff's JBIG turns the bits of the usual fill order, not of the other one.
+    if (!moForm.mbReversedBits)
+        codec::ReverseBits(aHeader, aHeader, HEADER_BYTES);
+    if (nRaw < HEADER_BYTES || aHeader[2] != 1 || ReadNumber(aHeader + 4, 4, true) != moForm.mnStrileWidth ||
+        ReadNumber(aHeader + 8, 4, true) > moForm.mnStrileHeight ||
+        ReadNumber(aHeader + 12, 4, true) > moForm.mnStrileHeight)
+        moPage.Fail(Describe(nStrile) + ": its JBIG stream is of another size");
+}
+
+void StrileDecoder::DecodeByLibrary(std::uint32_t nStrile, unsigned char* pRaw, std::size_t nRaw,
+                                    unsigned char* pTarget, std::size_t nBytes)
+{
+    CheckStream(nStrile, pRaw, nRaw);
+    TiffHandle& oHandle = moPage.GetHandle();
+    const int nDone = TIFFReadFromUserBuffer(oHandle.Get(), nStrile, pRaw, static_cast<tmsize_t>(nRaw), pTarget,
+                                             static_cast<tmsize_t>(nBytes));
+    const std::string message = oHandle.TakeMessage("its data are damaged");
+    if (nDone != 1 || oHandle.HasLostData())
+        moPage.Fail(Describe(nStrile) + ": " + message);
+}
+
+void StrileDecoder::Decode(std::uint32_t nStrile, std::uint32_t nStoredRows, unsigned char* pRaw, std::size_t nRaw,
+                           const WantedPixels& oWanted)
+{
+    const bool bOwn = moForm.IsOwnCodec();
+    const std::size_t nStoredPitch = moForm.GetStoredRowBytes(moForm.mnStrileWidth);
+    const std::size_t nBytes = nStoredPitch * (bOwn ? oWanted.mnRows : nStoredRows);
+    const bool bDirect = moForm.moSample.meWidening == Widening::eNone && oWanted.mnPitch == nStoredPitch &&
+                         oWanted.mnWidth == moForm.mnStrileWidth && (bOwn || oWanted.mnRows == nStoredRows);
+    unsigned char* pStored = bDirect ? oWanted.mpTarget : moScratch.Get(nBytes);
+    if (!bOwn)
+    {
+        // A codec that stops early must not hand out what was there before.
+        std::memset(pStored, 0, nBytes);
+        DecodeByLibrary(nStrile, pRaw, nRaw, pStored, nBytes);
+        return ConvertDecoded(pStored, nStoredPitch, oWanted);
+    }
+    const codec::Result oResult = DecodeOwn(pRaw, nRaw, pStored, nBytes);
+    if (!oResult.IsDone())
+        moPage.Fail(Describe(nStrile) + ": " + codec::StatusText(oResult.moStatus));
+    if (moForm.mnPredictor != PREDICTOR_NONE)
+        return UndoPredictor(pStored, nStoredPitch, moForm.mnStrileWidth, oWanted);
+    Finish(pStored, nStoredPitch, GetOrder() == codec::SampleOrder::eSwapped, oWanted);
+}
+
+void StrileDecoder::UndoPredictor(unsigned char* pStored, std::size_t nStoredPitch, std::uint32_t nStoredWidth,
+                                  const WantedPixels& oWanted)
+{
+    const SampleForm& oSample = moForm.moSample;
+    codec::BlockShape oShape{nStoredWidth, oWanted.mnRows, moForm.GetPlaneChannels(), oSample.GetBits() / 8};
+    const bool bWiden = oSample.meWidening != Widening::eNone;
+    if (moForm.mnPredictor == PREDICTOR_FLOATINGPOINT)
+    {
+        codec::UndoFloatingPoint(pStored, nStoredPitch, pStored, nStoredPitch, oShape, moPredictorScratch);
+        return Finish(pStored, nStoredPitch, false, oWanted);
+    }
+    oShape.mnWidth = oWanted.mnWidth;
+    unsigned char* pTarget = bWiden ? pStored : oWanted.mpTarget;
+    const std::size_t nPitch = bWiden ? nStoredPitch : oWanted.mnPitch;
+    codec::UndoHorizontal(pStored, nStoredPitch, pTarget, nPitch, oShape, GetOrder());
+    if (bWiden)
+        Finish(pStored, nStoredPitch, false, oWanted);
+}
+
+void StrileDecoder::Convert(unsigned char* pStored, std::size_t nStoredPitch, const WantedPixels& oWanted)
+{
+    Finish(pStored, nStoredPitch, GetOrder() == codec::SampleOrder::eSwapped, oWanted);
+}
+
+void StrileDecoder::ConvertDecoded(unsigned char* pStored, std::size_t nStoredPitch, const WantedPixels& oWanted)
+{
+    // libtiff turns round words of these widths and leaves all others as they are stored.
+    const unsigned int nBits = moForm.moSample.GetBits();
+    const bool bTurned = nBits == 16 || nBits == 24 || nBits == 32 || nBits == 64 || nBits == 128;
+    Finish(pStored, nStoredPitch, !bTurned && GetOrder() == codec::SampleOrder::eSwapped, oWanted);
+}
+
+// bSwapped: whole samples are still in the other byte order.
+void StrileDecoder::Finish(unsigned char* pStored, std::size_t nStoredPitch, bool bSwapped, const WantedPixels& oWanted)
+{
+    const SampleForm& oSample = moForm.moSample;
+    const std::size_t nSamples = std::size_t{oWanted.mnWidth} * moForm.GetPlaneChannels();
+    const std::size_t nPartBytes = oSample.mnPartBits / 8;
+    const bool bTurn = oSample.mnPartBits % 8 == 0 && nPartBytes > 1 && bSwapped;
+    if (oSample.meWidening == Widening::eNone)
+    {
+        if (!bTurn)
+            return CopyRows(pStored, nStoredPitch, oWanted, nSamples * oSample.GetValueBytes());
+        for (std::uint32_t nRow = 0; nRow < oWanted.mnRows; ++nRow)
+            codec::SwapBytes(pStored + nRow * nStoredPitch, oWanted.mpTarget + nRow * oWanted.mnPitch,
+                             nSamples * oSample.mnParts, nPartBytes);
+        return;
+    }
+    // Words of five to seven bytes are packed bits in big-endian files; libtiff leaves them as they are.
+    const bool bLongWords = oSample.meWidening == Widening::eBits && oSample.mnPartBits % 8 == 0 && nPartBytes > 1;
+    const bool bTurnWords = bLongWords ? !moForm.mbBigEndian : bTurn;
+    for (std::uint32_t nRow = 0; nRow < oWanted.mnRows; ++nRow)
+    {
+        unsigned char* pRow = pStored + nRow * nStoredPitch;
+        if (bTurnWords)
+            codec::SwapBytes(pRow, pRow, nSamples * oSample.mnParts, nPartBytes);
+        WidenRow(oSample, pRow, oWanted.mpTarget + nRow * oWanted.mnPitch, nSamples);
+    }
+}
+
+} // namespace krv::plugins::tif

@@ -1,0 +1,95 @@
+#include "plugins/tif/striletable.h"
+
+#include "toolkit/exceptions/exceptions.h"
+
+#include <algorithm>
+
+#include <tiff.h>
+
+namespace krv::plugins::tif
+{
+
+namespace
+{
+
+const DirectoryEntry* FindEither(const RawDirectory& oDirectory, std::uint16_t nFirst, std::uint16_t nSecond)
+{
+    const DirectoryEntry* pEntry = oDirectory.Find(nFirst);
+    return pEntry != nullptr ? pEntry : oDirectory.Find(nSecond);
+}
+
+} // namespace
+
+StrileArray::StrileArray(const support::File& oFile, const DirectoryEntry& oEntry, bool bBigEndian)
+    : mnCount(oEntry.mnCount), mnOffset(oEntry.mnOffset), mnValueBytes(GetTypeBytes(oEntry.mnType)),
+      mbBigEndian(bBigEndian), moPages(PAGES)
+{
+    const bool bWhole = oEntry.mnType == TIFF_BYTE || oEntry.mnType == TIFF_SHORT || oEntry.mnType == TIFF_LONG ||
+                        oEntry.mnType == TIFF_LONG8 || oEntry.mnType == TIFF_IFD || oEntry.mnType == TIFF_IFD8 ||
+                        oEntry.mnType == TIFF_SLONG || oEntry.mnType == TIFF_SLONG8 || oEntry.mnType == TIFF_SSHORT;
+    if (!bWhole)
+        throw FileFormatException(oFile.GetName(), oFile.GetName() + ": tag " + std::to_string(oEntry.mnTag) +
+                                                       " holds no whole numbers");
+}
+
+const StrileArray::Page& StrileArray::GetPage(const support::File& oFile, std::uint64_t nNumber)
+{
+    Page& oPage = moPages[nNumber % PAGES];
+    if (oPage.mnNumber == nNumber)
+        return oPage;
+    oPage.mnNumber = UINT64_MAX;
+    const std::uint64_t nFirst = nNumber * PAGE_VALUES;
+    const auto nValues = static_cast<std::size_t>(std::min<std::uint64_t>(PAGE_VALUES, mnCount - nFirst));
+    std::vector<unsigned char> oBytes(nValues * mnValueBytes);
+    const std::uint64_t nOffset = mnOffset + nFirst * mnValueBytes;
+    const std::size_t nGot = nOffset < mnOffset ? 0 : oFile.ReadUpTo(nOffset, oBytes.data(), oBytes.size());
+    oPage.moValues.resize(nGot / mnValueBytes);
+    for (std::size_t nAt = 0; nAt < oPage.moValues.size(); ++nAt)
+        oPage.moValues[nAt] = ReadNumber(oBytes.data() + nAt * mnValueBytes, mnValueBytes, mbBigEndian);
+    oPage.mnNumber = nNumber;
+    return oPage;
+}
+
+std::uint64_t StrileArray::Get(const support::File& oFile, std::uint64_t nIndex)
+{
+    const Page& oPage = GetPage(oFile, nIndex / PAGE_VALUES);
+    if (nIndex % PAGE_VALUES >= oPage.moValues.size())
+        throw FileFormatException(oFile.GetName(),
+                                  oFile.GetName() + ": the file is truncated: the list of its strips or tiles is cut "
+                                                    "off by the end of the file");
+    return oPage.moValues[nIndex % PAGE_VALUES];
+}
+
+IStrileIndex::~IStrileIndex() = default;
+
+StrileTable::StrileTable(const support::File& oFile, const RawDirectory& oDirectory, bool bBigEndian,
+                         std::uint64_t nStriles)
+    : moFile(oFile)
+{
+    const DirectoryEntry* pOffsets = FindEither(oDirectory, TIFFTAG_TILEOFFSETS, TIFFTAG_STRIPOFFSETS);
+    const DirectoryEntry* pBytes = FindEither(oDirectory, TIFFTAG_TILEBYTECOUNTS, TIFFTAG_STRIPBYTECOUNTS);
+    if (pOffsets == nullptr)
+        throw FileFormatException(oFile.GetName(), oFile.GetName() + ": the directory does not say where the " +
+                                                       std::to_string(nStriles) + " strips or tiles lie");
+    moOffsets = StrileArray(oFile, *pOffsets, bBigEndian);
+    mbByteCounts = pBytes != nullptr;
+    if (mbByteCounts)
+        moByteCounts = StrileArray(oFile, *pBytes, bBigEndian);
+}
+
+Strile StrileTable::Get(std::uint64_t nIndex)
+{
+    if (mpoIndex)
+        return mpoIndex->Get(nIndex);
+    if (nIndex >= moOffsets.GetCount() || (mbByteCounts && nIndex >= moByteCounts.GetCount()))
+        throw FileFormatException(moFile.GetName(),
+                                  moFile.GetName() + ": the directory lists " + std::to_string(moOffsets.GetCount()) +
+                                      " strips or tiles; number " + std::to_string(nIndex) + " is wanted");
+    Strile oStrile;
+    oStrile.mnOffset = moOffsets.Get(moFile, nIndex);
+    oStrile.mbBytesKnown = mbByteCounts;
+    oStrile.mnBytes = mbByteCounts ? moByteCounts.Get(moFile, nIndex) : 0;
+    return oStrile;
+}
+
+} // namespace krv::plugins::tif

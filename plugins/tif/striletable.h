@@ -1,0 +1,83 @@
+#pragma once
+
+#include "plugins/support/file.h"
+#include "plugins/tif/rawdirectory.h"
+
+#include <cstdint>
+#include <memory>
+#include <vector>
+
+namespace krv::plugins::tif
+{
+
+// One of the two arrays that say where strips or tiles lie, read from the file in pages when they are asked for: a
+// sparse file may have millions of tiles. One thread at a time.
+class StrileArray
+{
+public:
+    // No entry: every value is 0.
+    StrileArray() = default;
+    // Throws FileFormatException for a type of tag that holds no whole numbers.
+    StrileArray(const support::File& oFile, const DirectoryEntry& oEntry, bool bBigEndian);
+
+    std::uint64_t GetCount() const { return mnCount; }
+    // nIndex: below GetCount. Throws FileFormatException when the array is cut off by the end of the file.
+    std::uint64_t Get(const support::File& oFile, std::uint64_t nIndex);
+
+private:
+    static constexpr std::size_t PAGE_VALUES = 4096;
+    static constexpr std::size_t PAGES = 8;
+
+    struct Page
+    {
+        std::uint64_t mnNumber = UINT64_MAX;
+        std::vector<std::uint64_t> moValues;
+    };
+
+    const Page& GetPage(const support::File& oFile, std::uint64_t nNumber);
+
+    std::uint64_t mnCount = 0;
+    std::uint64_t mnOffset = 0;
+    std::size_t mnValueBytes = 0;
+    bool mbBigEndian = false;
+    std::vector<Page> moPages;
+};
+
+// A stored strip or tile.
+struct Strile
+{
+    std::uint64_t mnOffset = 0;
+    std::uint64_t mnBytes = 0; // 0: not stored
+    bool mbBytesKnown = true;  // false when the file does not say
+};
+
+// Where strips and tiles lie while a file is being written: known in memory before it stands in the file.
+class IStrileIndex
+{
+public:
+    virtual ~IStrileIndex();
+    virtual Strile Get(std::uint64_t nIndex) const = 0;
+};
+
+// Where the strips or tiles of a page lie.
+class StrileTable
+{
+public:
+    // nStriles: how many the page's geometry calls for. Throws FileFormatException when the page has no offsets.
+    StrileTable(const support::File& oFile, const RawDirectory& oDirectory, bool bBigEndian, std::uint64_t nStriles);
+
+    // Throws FileFormatException for a strile that the file does not list.
+    Strile Get(std::uint64_t nIndex);
+
+    // From now on the index answers in place of the file.
+    void Use(std::shared_ptr<const IStrileIndex> poIndex) { mpoIndex = std::move(poIndex); }
+
+private:
+    const support::File& moFile;
+    std::shared_ptr<const IStrileIndex> mpoIndex;
+    StrileArray moOffsets;
+    StrileArray moByteCounts;
+    bool mbByteCounts = false;
+};
+
+} // namespace krv::plugins::tif

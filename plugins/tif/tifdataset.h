@@ -1,0 +1,131 @@
+#pragma once
+
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/ipctdataset.h"
+#include "datasources/metadata/auxiliarydata.h"
+#include "plugins/support/dataset.h"
+#include "plugins/tif/page.h"
+#include "plugins/tif/pagelist.h"
+#include "plugins/tif/strilesource.h"
+#include "plugins/tif/writing/fileeditor.h"
+#include "toolkit/ogc/cs/geocodinginfo.h"
+
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace krv::plugins::tif
+{
+
+// A TIFF file: the image is its first page. Reduced pages are its levels, mask pages its bitmaps, the colour map its
+// pseudocolour table (number 1, of channel 1). Opening for reading reads the first page only; the rest is looked at
+// when it is asked for. With an editor the file can be changed: Synchronize and Close make the changes the file's and
+// report failure; a dataset that is destroyed without leaves an existing file as of the last Synchronize, and removes a
+// new one that was never synchronised.
+class TifDataset : public support::Dataset,
+                   public krv::datasources::IGeocodedDataset,
+                   public krv::datasources::IBitmapDataset,
+                   public krv::datasources::IPCTDataset
+{
+public:
+    // Throws krv::FileException kinds that name file and cause; nothing stays open then.
+    TifDataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat);
+    // A file to be updated, or a new one, whose image Create lays out.
+    TifDataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<FileEditor> poEditor);
+    ~TifDataset() override;
+
+    krv::datasources::FileAccessState Delete() override;
+    // A new file exists from Create on, though it has its name only after Synchronize.
+    bool Exists() const override;
+    void Synchronize() override;
+    // Types that differ throw DataException: a TIFF image has one.
+    void Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes) override;
+    using support::Dataset::Create;
+    krv::datasources::AccessCapabilities GetRasterCapabilities() override;
+
+    void AddNewChannel(const krv::gobs::RasterInfo& oInfo) override;
+    // Both make new pages of the image and its levels; I/O objects made before are of no more use.
+    void DeleteChannel(unsigned int nChannel) override;
+
+    krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
+    // Which levels are valid is not taken from the record: their manager keeps that.
+    void WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override;
+    void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;
+    krv::ogc::cs::ICRS* ReadCRS() const override;
+    void Close() override;
+    krv::datasources::IOverviewManager* GetOverviewManager() override;
+
+    // The identity when the file has no geocoding.
+    const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override;
+    void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) override;
+
+    std::vector<unsigned int> GetBitmapList() const override;
+    krv::datasources::IRasterIO* GetBitmapIO(const std::vector<unsigned int>& oBitmaps) override;
+    void DeleteBitmap(unsigned int nBitmap) override;
+    unsigned int CreateBitmap() override;
+    std::string GetBitmapDescription(unsigned int nBitmap) const override;
+    void SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription) override;
+    krv::datasources::MetadataMap GetBitmapMetadata(unsigned int nBitmap) const override;
+    void SetBitmapMetadata(unsigned int nBitmap, const krv::datasources::MetadataMap& oMetadata) override;
+    // Reduced masks belong to the first bitmap.
+    krv::datasources::IOverviewManager* GetBitmapOverviewManager() override;
+
+    std::vector<unsigned int> GetPCTList() const override;
+    krv::gobs::PCT* GetPCT(unsigned int nPCT) const override;
+    unsigned int GetPCTChannel(unsigned int nPCT) const override;
+    std::string GetPCTDescription(unsigned int nPCT) const override;
+    unsigned int CreatePCT(const krv::gobs::PCT& oTable, unsigned int nChannel) override;
+    void UpdatePCT(unsigned int nPCT, const krv::gobs::PCT& oTable) override;
+    void SetPCTDescription(unsigned int nPCT, const std::string& oDescription) override;
+    void DeletePCT(unsigned int nPCT) override;
+
+    // For the overview managers: the levels of the image or of the first bitmap, and the pixels of a page.
+    const std::vector<PageLevel>& GetLevels(PixelUse eUse) const;
+    std::shared_ptr<support::BlockImage> OpenPage(std::uint64_t nDirectory, PixelUse eUse);
+    krv::datasources::AuxiliaryData ReadPageMetadata(std::uint64_t nDirectory) const;
+
+    // For the overview managers: making levels, and the state of each as the channels' tag "_Overview_<level>" has it:
+    // "valid" or "invalid", a blank and the resampling method when it is known. Without a tag a level is valid.
+    void CreateLevel(unsigned int nLevel, PixelUse eUse, const Place& oPlace);
+    void DeleteLevel(unsigned int nLevel, PixelUse eUse, const Place& oPlace);
+    bool IsLevelValid(unsigned int nChannel, unsigned int nLevel, PixelUse eUse) const;
+    void SetLevelValid(unsigned int nChannel, unsigned int nLevel, bool bValid, PixelUse eUse, const Place& oPlace);
+    std::string GetResamplingName(PixelUse eUse) const;
+    void SetResamplingName(const std::string& name, const Place& oPlace);
+
+private:
+    struct PageTable;
+
+    void OpenImage();
+    void ChangeChannels(const std::vector<unsigned int>& oSources, const Place& oPlace);
+    std::uint64_t GetFullPage(PixelUse eUse) const;
+    const krv::datasources::AuxiliaryData& GetBook(PixelUse eUse) const;
+    void WriteBook(const krv::datasources::AuxiliaryData& oBook, PixelUse eUse, const Place& oPlace);
+    void WatchImage();
+    void InvalidateLevels();
+    void EditMask(unsigned int nBitmap, const krv::datasources::MetadataMap& oMetadata, const Place& oPlace);
+    void StorePCT(const krv::gobs::PCT& oTable, const Place& oPlace);
+    std::unique_ptr<support::IBlockSource> MakeSource(const std::shared_ptr<PageModel>& poModel, PixelUse eUse);
+    FileEditor& GetEditor(const char* pWhat, const Place& oPlace) const;
+    // After the pages of the file came, went or changed their tags.
+    void Refresh() const;
+    Page& GetPage(const Place& oPlace = Place::Current()) const;
+    const PageTable& GetPages() const;
+    const PageSummary& GetMask(unsigned int nBitmap, const Place& oPlace) const;
+    void CheckPCT(unsigned int nPCT, const Place& oPlace) const;
+
+    std::shared_ptr<FileEditor> mpoEditor; // null when the file is only read
+    std::shared_ptr<const support::File> mpoFile;
+    mutable std::shared_ptr<Page> mpoPage;
+    std::weak_ptr<PageWriter> mpoImageWriter;
+    std::string moResampling;
+    mutable std::map<PixelUse, krv::datasources::AuxiliaryData> moBooks;
+    mutable std::unique_ptr<PageTable> mpoPages;
+    mutable std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding;
+    std::map<std::pair<std::uint64_t, PixelUse>, std::shared_ptr<support::BlockImage>> moImages;
+};
+
+} // namespace krv::plugins::tif

@@ -1,0 +1,653 @@
+#include "plugins/tif/writing/fileeditor.h"
+
+#include "plugins/tif/writing/pagewriter.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <algorithm>
+#include <atomic>
+#include <cstdio>
+#include <unordered_set>
+#include <utility>
+
+#include <tiff.h>
+#include <unistd.h>
+
+namespace krv::plugins::tif
+{
+
+namespace
+{
+
+constexpr std::uint64_t CLASSIC_LIMIT = UINT32_MAX;
+// An image of this size gets a BigTIFF: its levels and directories want room too.
+constexpr std::uint64_t CLASSIC_IMAGE_LIMIT = std::uint64_t{2900} << 20;
+// Large blocks that begin at multiples of their own size are slow in the system's cache.
+constexpr std::uint64_t FIRST_BLOCK = 16384;
+constexpr std::uint64_t LARGE_BLOCK = 32768;
+constexpr std::uint64_t DIRECTORY_RESERVE = 65536;
+constexpr std::uint64_t MAXIMUM_STRILES = std::uint64_t{1} << 28;
+constexpr std::uint64_t LOADED_TAG_BYTES = 4096;
+constexpr std::uint64_t MAXIMUM_TAG_BYTES = std::uint64_t{96} << 20;
+constexpr std::size_t COPY_BYTES = std::size_t{1} << 20;
+
+bool IsOffsets(std::uint16_t nTag)
+{
+    return nTag == TIFFTAG_STRIPOFFSETS || nTag == TIFFTAG_TILEOFFSETS;
+}
+
+bool IsCounts(std::uint16_t nTag)
+{
+    return nTag == TIFFTAG_STRIPBYTECOUNTS || nTag == TIFFTAG_TILEBYTECOUNTS;
+}
+
+// In the folder of the file, so that it can be renamed, and of no length that a folder does not take.
+std::string MakeTemporaryName(const std::string& fileName)
+{
+    static std::atomic<unsigned int> nCounter = 0;
+    const std::size_t nSlash = fileName.rfind('/');
+    const std::size_t nBegin = nSlash == std::string::npos ? 0 : nSlash + 1;
+    return fileName.substr(0, nBegin) + "." + fileName.substr(nBegin, 200) + "." + std::to_string(::getpid()) + "." +
+           std::to_string(nCounter++) + ".part";
+}
+
+FileHeader ReadHeader(const support::File& oFile)
+{
+    unsigned char aHeader[FileHeader::BYTES] = {};
+    const std::size_t nBytes = oFile.ReadUpTo(0, aHeader, sizeof(aHeader));
+    const std::optional<FileHeader> oHeader = FileHeader::Parse(aHeader, nBytes);
+    if (!oHeader)
+        throw FileFormatException(oFile.GetName(), oFile.GetName() + ": is no TIFF file");
+    return *oHeader;
+}
+
+} // namespace
+
+// A directory that was written and the places of what it names, until it is committed.
+struct FileEditor::Written
+{
+    PageModel* mpPage = nullptr;
+    Extent moDirectory;
+    std::uint64_t mnNext = 0;
+    Extent moOffsetArray;
+    Extent moCountArray;
+};
+
+FileEditor::FileEditor(const std::string& fileName)
+    : moFileName(fileName), mpoFile(std::make_shared<support::File>(fileName, support::File::Mode::eUpdate)),
+      moHeader(ReadHeader(*mpoFile))
+{
+    mpoSpace = std::make_unique<Space>(fileName, mpoFile->GetSize(), moHeader.mbBigTiff ? INT64_MAX : CLASSIC_LIMIT);
+    mpoSpace->Age();
+    ReadPages();
+}
+
+FileEditor::FileEditor(const std::string& fileName, const CreateOptions& oOptions)
+    : moFileName(fileName), moOptions(oOptions), mbNamed(false)
+{
+}
+
+FileEditor::~FileEditor()
+{
+    Discard();
+}
+
+void FileEditor::Discard() noexcept
+{
+    mbEnded = true;
+    if (moTemporary.empty())
+        return;
+    std::remove(moTemporary.c_str());
+    moTemporary.clear();
+}
+
+void FileEditor::End()
+{
+    mbEnded = true;
+}
+
+void FileEditor::Fail(const std::string& what, const Place& oPlace) const
+{
+    throw FileFormatException(moFileName, moFileName + ": " + what, oPlace);
+}
+
+void FileEditor::CheckWritable(const Place& oPlace) const
+{
+    if (mbEnded)
+        throw DataException(moFileName + ": the dataset is closed", oPlace);
+}
+
+const std::shared_ptr<PageModel>& FileEditor::GetPage(std::uint64_t nNumber, const Place& oPlace) const
+{
+    const auto oFound =
+        std::find_if(moPages.begin(), moPages.end(),
+                     [nNumber](const std::shared_ptr<PageModel>& poPage) { return poPage->mnNumber == nNumber; });
+    if (oFound == moPages.end())
+        throw DataException(moFileName + ": the page is no longer there", oPlace);
+    return *oFound;
+}
+
+std::vector<PageSummary> FileEditor::Summarise() const
+{
+    std::vector<PageSummary> oSummaries;
+    for (const std::shared_ptr<PageModel>& poPage : moPages)
+        oSummaries.push_back(poPage->Summarise());
+    return oSummaries;
+}
+
+void FileEditor::ReadPages()
+{
+    std::unordered_set<std::uint64_t> oSeen;
+    for (std::uint64_t nOffset = moHeader.mnFirstDirectory; nOffset != 0;)
+    {
+        if (!oSeen.insert(nOffset).second || moPages.size() >= MAXIMUM_PAGES)
+            Fail("the chain of its directories has no end; it cannot be updated");
+        ReadPage(nOffset, false, nOffset);
+    }
+    const std::vector<std::uint64_t> oBelow = moPages.front()->moTags.GetNumbers(TIFFTAG_SUBIFD);
+    for (const std::uint64_t nOffset : oBelow)
+    {
+        std::uint64_t nNext = 0;
+        if (nOffset == 0 || !oSeen.insert(nOffset).second)
+            Fail("the directories below its first one cannot be followed; it cannot be updated");
+        ReadPage(nOffset, true, nNext);
+    }
+}
+
+void FileEditor::ReadPage(std::uint64_t nOffset, bool bBelowFirst, std::uint64_t& nNext)
+{
+    PeekReader oReader(*mpoFile);
+    const RawDirectory oDirectory(oReader, moHeader, nOffset);
+    auto poPage = std::make_shared<PageModel>(moHeader.mbBigEndian);
+    const std::size_t nWord = moHeader.mbBigTiff ? 8 : 4;
+    for (const DirectoryEntry& oEntry : oDirectory.GetEntries())
+    {
+        if (IsOffsets(oEntry.mnTag) || IsCounts(oEntry.mnTag))
+            continue;
+        Tag oTag{oEntry.mnTag, oEntry.mnType, oEntry.mnCount, {}, {}};
+        if (GetTypeBytes(oEntry.mnType) == 0 || oEntry.GetBytes() > MAXIMUM_TAG_BYTES)
+            Fail("tag " + std::to_string(oEntry.mnTag) + " is of an unknown type or size; the file cannot be updated");
+        if (oEntry.GetBytes() > nWord)
+            oTag.moStored = {oEntry.mnOffset, oEntry.GetBytes(), 0};
+        else
+            oTag.moBytes.resize(oEntry.GetBytes());
+        if (oTag.moBytes.size() != oEntry.GetBytes() && oEntry.GetBytes() <= LOADED_TAG_BYTES)
+            Load(oTag);
+        else if (!oTag.moBytes.empty())
+            mpoFile->Read(oEntry.mnOffset, oTag.moBytes.data(), oTag.moBytes.size());
+        poPage->moTags.GetTags().push_back(std::move(oTag));
+    }
+    std::stable_sort(poPage->moTags.GetTags().begin(), poPage->moTags.GetTags().end(),
+                     [](const Tag& oFirst, const Tag& oSecond) { return oFirst.mnTag < oSecond.mnTag; });
+    ReadStriles(*poPage, oDirectory);
+    const std::size_t nEntryBytes = 4 + 2 * nWord;
+    poPage->moDirectory = {nOffset, (moHeader.mbBigTiff ? 8 : 2) + oDirectory.GetEntries().size() * nEntryBytes + nWord,
+                           0};
+    poPage->mnNext = oDirectory.GetNext();
+    poPage->mbBelowFirst = bBelowFirst;
+    poPage->mnNumber = mnNextNumber++;
+    nNext = oDirectory.GetNext();
+    moPages.push_back(std::move(poPage));
+}
+
+void FileEditor::ReadStriles(PageModel& oPage, const RawDirectory& oDirectory)
+{
+    const DirectoryEntry* pOffsets = nullptr;
+    const DirectoryEntry* pCounts = nullptr;
+    for (const DirectoryEntry& oEntry : oDirectory.GetEntries())
+    {
+        if (pOffsets == nullptr && IsOffsets(oEntry.mnTag))
+            pOffsets = &oEntry;
+        if (pCounts == nullptr && IsCounts(oEntry.mnTag))
+            pCounts = &oEntry;
+    }
+    const std::uint64_t nStriles = oPage.CountStriles();
+    if (pOffsets == nullptr || pCounts == nullptr || pOffsets->mnCount < nStriles || pCounts->mnCount < nStriles)
+        Fail("a directory does not say where all strips or tiles lie and how long they are; it cannot be updated");
+    if (nStriles > MAXIMUM_STRILES)
+        Fail("there are too many strips or tiles to be updated");
+    oPage.SetStriles(nStriles);
+    const std::size_t nWord = moHeader.mbBigTiff ? 8 : 4;
+    oPage.moOffsets = ReadArray(*pOffsets);
+    oPage.moByteCounts = ReadArray(*pCounts);
+    oPage.moOffsets.resize(nStriles);
+    oPage.moByteCounts.resize(nStriles);
+    oPage.moRoom = oPage.moByteCounts;
+    if (pOffsets->GetBytes() > nWord)
+        oPage.moOffsetArray = {pOffsets->mnOffset, pOffsets->GetBytes(), 0};
+    if (pCounts->GetBytes() > nWord)
+        oPage.moCountArray = {pCounts->mnOffset, pCounts->GetBytes(), 0};
+    // Arrays are written anew in the types that they get here.
+    const std::uint16_t nType = moHeader.mbBigTiff ? TIFF_LONG8 : TIFF_LONG;
+    oPage.mbArraysStale = pOffsets->mnType != nType || pCounts->mnType != nType || pOffsets->mnCount != nStriles ||
+                          pCounts->mnCount != nStriles;
+}
+
+std::vector<std::uint64_t> FileEditor::ReadArray(const DirectoryEntry& oEntry)
+{
+    const std::size_t nValueBytes = GetTypeBytes(oEntry.mnType);
+    if (nValueBytes == 0 || oEntry.GetBytes() > mpoFile->GetSize())
+        Fail("the list of its strips or tiles is longer than the file");
+    std::vector<unsigned char> oBytes(oEntry.GetBytes());
+    mpoFile->Read(oEntry.mnOffset, oBytes.data(), oBytes.size());
+    std::vector<std::uint64_t> oValues(oEntry.mnCount);
+    for (std::size_t nAt = 0; nAt < oValues.size(); ++nAt)
+        oValues[nAt] = ReadNumber(oBytes.data() + nAt * nValueBytes, nValueBytes, moHeader.mbBigEndian);
+    return oValues;
+}
+
+void FileEditor::Load(Tag& oTag)
+{
+    if (!oTag.moBytes.empty() || oTag.mnCount == 0)
+        return;
+    if (oTag.moStored.mnOffset > mpoFile->GetSize() || oTag.GetBytes() > mpoFile->GetSize() - oTag.moStored.mnOffset)
+        Fail("the file is truncated: tag " + std::to_string(oTag.mnTag) + " lies behind its end");
+    oTag.moBytes.resize(oTag.GetBytes());
+    mpoFile->Read(oTag.moStored.mnOffset, oTag.moBytes.data(), oTag.moBytes.size());
+}
+
+void FileEditor::LoadTags(PageModel& oPage)
+{
+    for (Tag& oTag : oPage.moTags.GetTags())
+        Load(oTag);
+}
+
+void FileEditor::CreateFile(bool bBigTiff, bool bGap)
+{
+    const std::string temporary = MakeTemporaryName(moFileName);
+    mpoFile = std::make_shared<support::File>(temporary, support::File::Mode::eCreate);
+    moTemporary = temporary;
+    mpoFile->ShowAs(moFileName);
+    moHeader = FileHeader();
+    moHeader.mbBigTiff = bBigTiff;
+    const std::uint64_t nHeader = moHeader.GetBytes();
+    mpoSpace = std::make_unique<Space>(moFileName, bGap ? FIRST_BLOCK : nHeader, bBigTiff ? INT64_MAX : CLASSIC_LIMIT);
+    if (bGap)
+        mpoSpace->AddGap(nHeader, FIRST_BLOCK - nHeader);
+    else
+        mpoSpace->AddGap(nHeader, 0);
+}
+
+std::shared_ptr<PageModel> FileEditor::AddFirstPage(const NewImage& oImage, const Place& oPlace)
+{
+    CheckWritable(oPlace);
+    std::shared_ptr<PageModel> poPage = MakeImagePage(oImage, moOptions, false, oPlace);
+    if (poPage->GetStriles() > MAXIMUM_STRILES)
+        throw DataException(moFileName + ": the image would have " + std::to_string(poPage->GetStriles()) +
+                                " strips or tiles; choose larger ones (options BLOCKXSIZE, BLOCKYSIZE)",
+                            oPlace);
+    const std::uint64_t nPixelBytes = oImage.moType.GetValueBits() / 8 * oImage.mnChannels;
+    const std::uint64_t nPixels = std::uint64_t{oImage.mnWidth} * oImage.mnHeight;
+    const std::uint64_t nBytes = nPixels > INT64_MAX / nPixelBytes ? INT64_MAX : nPixels * nPixelBytes;
+    using Choice = CreateOptions::Choice;
+    const bool bBig = moOptions.meBigTiff == Choice::eYes ||
+                      (moOptions.meBigTiff == Choice::eAutomatic && nBytes > CLASSIC_IMAGE_LIMIT);
+    if (!bBig && moOptions.mnCompression == COMPRESSION_NONE && nBytes > CLASSIC_LIMIT - DIRECTORY_RESERVE)
+        throw DataException(moFileName + ": an image of " + std::to_string(nBytes) +
+                                " bytes does not fit into classic TIFF (option BIGTIFF=NO)",
+                            oPlace);
+    CreateFile(bBig, nBytes / poPage->GetStriles() >= LARGE_BLOCK && moOptions.mnCompression == COMPRESSION_NONE);
+    AddPage(poPage);
+    return poPage;
+}
+
+void FileEditor::AddPage(std::shared_ptr<PageModel> poPage)
+{
+    CheckWritable();
+    poPage->mnNumber = mnNextNumber++;
+    poPage->mbStrilesChanged = true;
+    const auto oBelow = std::find_if(moPages.begin(), moPages.end(),
+                                     [](const std::shared_ptr<PageModel>& poOther) { return poOther->mbBelowFirst; });
+    moPages.insert(oBelow, std::move(poPage));
+    mbChanged = true;
+}
+
+void FileEditor::ReleaseStriles(const PageModel& oPage)
+{
+    for (std::size_t nAt = 0; nAt < oPage.moOffsets.size(); ++nAt)
+        if (oPage.moRoom[nAt] != 0)
+            moReleased.push_back({oPage.moOffsets[nAt], oPage.moRoom[nAt], oPage.moGenerations[nAt]});
+    for (const Extent& oExtent : {oPage.moDirectory, oPage.moDraft, oPage.moOffsetArray, oPage.moCountArray})
+        if (oExtent.mnBytes != 0)
+            moReleased.push_back(oExtent);
+}
+
+void FileEditor::RemovePage(std::uint64_t nNumber)
+{
+    CheckWritable();
+    const std::shared_ptr<PageModel> poPage = GetPage(nNumber);
+    ReleaseStriles(*poPage);
+    for (const Tag& oTag : poPage->moTags.GetTags())
+        if (oTag.moStored.mnBytes != 0)
+            moReleased.push_back(oTag.moStored);
+    moPages.erase(std::find(moPages.begin(), moPages.end(), poPage));
+    if (poPage->mbBelowFirst)
+        moPages.front()->moTags.Touch();
+    mbChanged = true;
+}
+
+void FileEditor::ReplacePage(std::shared_ptr<PageModel> poPage)
+{
+    CheckWritable();
+    const std::shared_ptr<PageModel> poOld = GetPage(poPage->mnNumber);
+    ReleaseStriles(*poOld);
+    for (const Tag& oTag : poOld->moTags.GetTags())
+        if (oTag.moStored.mnBytes != 0)
+            moReleased.push_back(oTag.moStored);
+    poPage->mbBelowFirst = poOld->mbBelowFirst;
+    poPage->mnNext = poOld->mnNext;
+    poPage->mbStrilesChanged = true;
+    *std::find(moPages.begin(), moPages.end(), poOld) = std::move(poPage);
+    mbChanged = true;
+}
+
+void FileEditor::Register(const std::shared_ptr<PageWriter>& poWriter)
+{
+    std::erase_if(moWriters, [](const std::weak_ptr<PageWriter>& poOther) { return poOther.expired(); });
+    moWriters.push_back(poWriter);
+}
+
+// What the directories will take, so that blocks never use the last of a classic file's room.
+std::uint64_t FileEditor::GetReserve() const
+{
+    std::uint64_t nBytes = DIRECTORY_RESERVE;
+    for (const std::shared_ptr<PageModel>& poPage : moPages)
+        nBytes += poPage->GetStriles() * 8 + 512;
+    return moHeader.mbBigTiff ? 0 : nBytes;
+}
+
+void FileEditor::StoreStrile(PageModel& oPage, std::uint64_t nStrile, const unsigned char* pBytes, std::size_t nBytes)
+{
+    CheckWritable();
+    const Extent oOld{oPage.moOffsets[nStrile], oPage.moRoom[nStrile], oPage.moGenerations[nStrile]};
+    const bool bOwn = oOld.mnBytes != 0 && mpoSpace->IsFresh(oOld);
+    if (bOwn && nBytes <= oOld.mnBytes)
+    {
+        mpoFile->Write(oOld.mnOffset, pBytes, nBytes);
+        mpoSpace->Release(oOld, nBytes);
+        oPage.moRoom[nStrile] = std::min<std::uint64_t>(nBytes + nBytes % 2, oOld.mnBytes);
+        oPage.moByteCounts[nStrile] = nBytes;
+        oPage.mbStrilesChanged = true;
+        return;
+    }
+    const Extent oNew = mpoSpace->Allocate(nBytes, GetReserve());
+    try
+    {
+        mpoFile->Write(oNew.mnOffset, pBytes, nBytes);
+    }
+    catch (...)
+    {
+        mpoSpace->Release(oNew);
+        throw;
+    }
+    if (oOld.mnBytes != 0)
+        mpoSpace->Release(oOld);
+    oPage.moOffsets[nStrile] = oNew.mnOffset;
+    oPage.moByteCounts[nStrile] = nBytes;
+    oPage.moRoom[nStrile] = oNew.mnBytes;
+    oPage.moGenerations[nStrile] = static_cast<std::uint32_t>(oNew.mnGeneration);
+    oPage.mbStrilesChanged = true;
+}
+
+std::uint64_t FileEditor::OwnStrile(PageModel& oPage, std::uint64_t nStrile, std::size_t nBytes)
+{
+    CheckWritable();
+    const Extent oOld{oPage.moOffsets[nStrile], oPage.moRoom[nStrile], oPage.moGenerations[nStrile]};
+    if (oPage.moByteCounts[nStrile] == nBytes && mpoSpace->IsFresh(oOld))
+        return oOld.mnOffset;
+    const Extent oNew = mpoSpace->Allocate(nBytes, GetReserve());
+    try
+    {
+        std::vector<unsigned char> oBytes(std::min(nBytes, COPY_BYTES));
+        for (std::size_t nDone = 0; nDone < nBytes; nDone += oBytes.size())
+        {
+            oBytes.resize(std::min(nBytes - nDone, COPY_BYTES));
+            const std::size_t nStored = oPage.moByteCounts[nStrile];
+            const std::size_t nOld = nStored > nDone ? std::min(nStored - nDone, oBytes.size()) : 0;
+            std::fill(oBytes.begin() + static_cast<std::ptrdiff_t>(nOld), oBytes.end(), static_cast<unsigned char>(0));
+            if (nOld != 0)
+                mpoFile->Read(oOld.mnOffset + nDone, oBytes.data(), nOld);
+            mpoFile->Write(oNew.mnOffset + nDone, oBytes.data(), oBytes.size());
+        }
+    }
+    catch (...)
+    {
+        mpoSpace->Release(oNew);
+        throw;
+    }
+    if (oOld.mnBytes != 0)
+        mpoSpace->Release(oOld);
+    oPage.moOffsets[nStrile] = oNew.mnOffset;
+    oPage.moByteCounts[nStrile] = nBytes;
+    oPage.moRoom[nStrile] = oNew.mnBytes;
+    oPage.moGenerations[nStrile] = static_cast<std::uint32_t>(oNew.mnGeneration);
+    oPage.mbStrilesChanged = true;
+    return oNew.mnOffset;
+}
+
+// The directory, then the values that are not in the file yet, in one piece; the arrays each in a place of their own.
+FileEditor::Written FileEditor::WriteDirectory(PageModel& oPage, std::uint64_t nNext, bool bDraft)
+{
+    const bool bBig = moHeader.mbBigTiff;
+    const bool bOrder = moHeader.mbBigEndian;
+    const std::size_t nWord = bBig ? 8 : 4;
+    const std::uint64_t nStriles = oPage.GetStriles();
+    const std::uint16_t nArrayType = bBig ? TIFF_LONG8 : TIFF_LONG;
+    Written oWritten{&oPage, {}, nNext, oPage.moOffsetArray, oPage.moCountArray};
+
+    const auto WriteArray = [&](const std::vector<std::uint64_t>& oValues, Extent& oArray)
+    {
+        if (nStriles * nWord <= nWord || bDraft ||
+            (!oPage.mbStrilesChanged && !oPage.mbArraysStale && oArray.mnBytes != 0))
+            return;
+        std::vector<unsigned char> oBytes;
+        oBytes.reserve(nStriles * nWord);
+        for (const std::uint64_t nValue : oValues)
+            AppendNumber(oBytes, nValue, nWord, bOrder);
+        oArray = mpoSpace->Allocate(oBytes.size());
+        mpoFile->Write(oArray.mnOffset, oBytes.data(), oBytes.size());
+    };
+    WriteArray(oPage.moOffsets, oWritten.moOffsetArray);
+    WriteArray(oPage.moByteCounts, oWritten.moCountArray);
+
+    std::vector<Tag>& oTags = oPage.moTags.GetTags();
+    for (Tag& oTag : oTags)
+        if (oTag.GetBytes() > nWord && oTag.moStored.mnBytes == 0)
+        {
+            Extent oPlace = mpoSpace->Allocate(oTag.GetBytes());
+            mpoFile->Write(oPlace.mnOffset, oTag.moBytes.data(), oTag.moBytes.size());
+            oTag.moStored = oPlace;
+        }
+
+    std::vector<unsigned char> oBytes;
+    AppendNumber(oBytes, oTags.size() + 2, bBig ? 8 : 2, bOrder);
+    const auto AddEntry = [&](std::uint16_t nTag, std::uint16_t nType, std::uint64_t nCount)
+    {
+        AppendNumber(oBytes, nTag, 2, bOrder);
+        AppendNumber(oBytes, nType, 2, bOrder);
+        AppendNumber(oBytes, nCount, nWord, bOrder);
+    };
+    const auto AddArray = [&](std::uint16_t nTag, const std::vector<std::uint64_t>& oValues, const Extent& oArray)
+    {
+        AddEntry(nTag, nArrayType, nStriles);
+        AppendNumber(oBytes,
+                     nStriles == 1 ? oValues.front()
+                     : bDraft      ? moHeader.GetBytes()
+                                   : oArray.mnOffset,
+                     nWord, bOrder);
+    };
+    const std::uint16_t nOffsets = oPage.IsTiled() ? TIFFTAG_TILEOFFSETS : TIFFTAG_STRIPOFFSETS;
+    const std::uint16_t nCounts = oPage.IsTiled() ? TIFFTAG_TILEBYTECOUNTS : TIFFTAG_STRIPBYTECOUNTS;
+    bool bOffsets = false;
+    bool bCounts = false;
+    const auto AddArraysBefore = [&](unsigned int nTag)
+    {
+        if (!bOffsets && nTag > nOffsets)
+            AddArray(nOffsets, oPage.moOffsets, oWritten.moOffsetArray), bOffsets = true;
+        if (!bCounts && nTag > nCounts)
+            AddArray(nCounts, oPage.moByteCounts, oWritten.moCountArray), bCounts = true;
+    };
+    for (const Tag& oTag : oTags)
+    {
+        AddArraysBefore(oTag.mnTag);
+        AddEntry(oTag.mnTag, oTag.mnType, oTag.mnCount);
+        if (oTag.GetBytes() > nWord)
+            AppendNumber(oBytes, oTag.moStored.mnOffset, nWord, bOrder);
+        else
+        {
+            oBytes.insert(oBytes.end(), oTag.moBytes.begin(), oTag.moBytes.end());
+            oBytes.resize(oBytes.size() + nWord - oTag.moBytes.size());
+        }
+    }
+    AddArraysBefore(UINT32_MAX);
+    AppendNumber(oBytes, nNext, nWord, bOrder);
+    oWritten.moDirectory = mpoSpace->Allocate(oBytes.size());
+    mpoFile->Write(oWritten.moDirectory.mnOffset, oBytes.data(), oBytes.size());
+    return oWritten;
+}
+
+std::shared_ptr<Page> FileEditor::OpenPage(const std::shared_ptr<PageModel>& poPage)
+{
+    std::uint64_t nOffset = poPage->moDirectory.mnOffset;
+    if (poPage->moTags.IsChanged() || nOffset == 0)
+    {
+        if (poPage->moDraft.mnBytes != 0)
+            mpoSpace->Release(poPage->moDraft);
+        poPage->moDraft = {};
+        poPage->moDraft = WriteDirectory(*poPage, 0, true).moDirectory;
+        nOffset = poPage->moDraft.mnOffset;
+    }
+    auto poOpened = std::make_shared<Page>(mpoFile, moHeader, nOffset);
+    poOpened->GetStriles().Use(poPage);
+    return poOpened;
+}
+
+bool FileEditor::IsChanged() const
+{
+    return mbChanged || std::any_of(moPages.begin(), moPages.end(),
+                                    [](const std::shared_ptr<PageModel>& poPage) { return poPage->IsChanged(); });
+}
+
+// From the last page to the first: each names the place of the next one.
+std::vector<FileEditor::Written> FileEditor::WriteDirectories()
+{
+    std::vector<Written> oWritten;
+    try
+    {
+        std::vector<std::uint64_t> oBelow;
+        for (const std::shared_ptr<PageModel>& poPage : moPages)
+            if (poPage->mbBelowFirst)
+            {
+                if (poPage->IsChanged())
+                    oWritten.push_back(WriteDirectory(*poPage, poPage->mnNext, false));
+                oBelow.push_back(poPage->IsChanged() ? oWritten.back().moDirectory.mnOffset
+                                                     : poPage->moDirectory.mnOffset);
+            }
+        TagList& oTags = moPages.front()->moTags;
+        if (oBelow.empty())
+            oTags.Remove(TIFFTAG_SUBIFD);
+        else if (oBelow != oTags.GetNumbers(TIFFTAG_SUBIFD))
+            oTags.SetNumbers(TIFFTAG_SUBIFD, oTags.Find(TIFFTAG_SUBIFD)->mnType, oBelow);
+
+        std::uint64_t nNext = 0;
+        for (std::size_t nAt = moPages.size() - oBelow.size(); nAt-- > 0;)
+        {
+            PageModel& oPage = *moPages[nAt];
+            const bool bWrite = oPage.IsChanged() || oPage.mnNext != nNext;
+            if (bWrite)
+                oWritten.push_back(WriteDirectory(oPage, nNext, false));
+            nNext = bWrite ? oWritten.back().moDirectory.mnOffset : oPage.moDirectory.mnOffset;
+        }
+    }
+    catch (...)
+    {
+        ReleaseWritten(oWritten);
+        throw;
+    }
+    return oWritten;
+}
+
+void FileEditor::ReleaseWritten(const std::vector<Written>& oWritten)
+{
+    for (const Written& oDirectory : oWritten)
+        for (const Extent& oExtent : {oDirectory.moDirectory, oDirectory.moOffsetArray, oDirectory.moCountArray})
+            if (oExtent.mnBytes != 0 && mpoSpace->IsFresh(oExtent))
+                mpoSpace->Release(oExtent);
+}
+
+void FileEditor::StoreHeld()
+{
+    for (const std::weak_ptr<PageWriter>& poWeak : moWriters)
+        if (const std::shared_ptr<PageWriter> poWriter = poWeak.lock())
+            poWriter->Flush();
+}
+
+void FileEditor::Synchronize()
+{
+    CheckWritable();
+    StoreHeld();
+    if (!HasPages())
+        return;
+    if (IsChanged())
+        Commit(WriteDirectories());
+    if (moTemporary.empty())
+        return;
+    mpoFile->Rename(moFileName);
+    moTemporary.clear();
+    mbNamed = true;
+}
+
+// What was written reaches the disk before the one number that makes it the file's, and that before anything of the
+// former state is given up.
+void FileEditor::Commit(const std::vector<Written>& oWritten)
+{
+    const Written& oFirst = oWritten.back();
+    const bool bFirst = oFirst.mpPage == moPages.front().get();
+    try
+    {
+        mpoFile->Flush();
+    }
+    catch (...)
+    {
+        ReleaseWritten(oWritten);
+        throw;
+    }
+    mpoSpace->Age();
+    moHeader.mnFirstDirectory = bFirst ? oFirst.moDirectory.mnOffset : moPages.front()->moDirectory.mnOffset;
+    unsigned char aHeader[FileHeader::BYTES] = {};
+    moHeader.Write(aHeader, moHeader.mnFirstDirectory);
+    const std::size_t nPlace = moHeader.mbBigTiff ? 8 : 4;
+    const bool bNew = !moTemporary.empty();
+    mpoFile->Write(bNew ? 0 : nPlace, aHeader + (bNew ? 0 : nPlace), moHeader.GetBytes() - (bNew ? 0 : nPlace));
+    mpoFile->Flush();
+
+    for (const Written& oDirectory : oWritten)
+        Adopt(oDirectory);
+    for (const std::shared_ptr<PageModel>& poPage : moPages)
+        for (const Extent& oExtent : poPage->moTags.TakeReleased())
+            mpoSpace->Release(oExtent);
+    for (const Extent& oExtent : std::exchange(moReleased, {}))
+        mpoSpace->Release(oExtent);
+    mbChanged = false;
+    mpoSpace->Reuse();
+}
+
+void FileEditor::Adopt(const Written& oWritten)
+{
+    PageModel& oPage = *oWritten.mpPage;
+    const auto Replace = [this](Extent& oOld, const Extent& oNew)
+    {
+        if (oOld.mnBytes != 0 && oOld.mnOffset != oNew.mnOffset)
+            mpoSpace->Release(oOld);
+        oOld = oNew;
+    };
+    Replace(oPage.moDirectory, oWritten.moDirectory);
+    Replace(oPage.moOffsetArray, oWritten.moOffsetArray);
+    Replace(oPage.moCountArray, oWritten.moCountArray);
+    Replace(oPage.moDraft, {});
+    oPage.mnNext = oWritten.mnNext;
+    oPage.mbStrilesChanged = false;
+    oPage.mbArraysStale = false;
+    oPage.moTags.Settle();
+}
+
+} // namespace krv::plugins::tif

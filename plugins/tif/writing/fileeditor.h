@@ -1,0 +1,113 @@
+#pragma once
+
+#include "plugins/support/file.h"
+#include "plugins/tif/page.h"
+#include "plugins/tif/writing/pagemodel.h"
+#include "plugins/tif/writing/space.h"
+
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace krv::plugins::tif
+{
+
+class PageWriter;
+
+// A TIFF file that is being written. Its structure is kept here, in memory; blocks and directories are only ever added
+// to the file, beside what its committed state uses. Synchronize writes the new directories and makes them the file's
+// by changing one number: the place of the first directory. A file that is left at any moment is therefore as of the
+// last Synchronize. A new file lies under a temporary name in its folder until the first Synchronize gives it its own;
+// an editor that goes before removes it. One thread at a time.
+class FileEditor : public std::enable_shared_from_this<FileEditor>
+{
+public:
+    // For an existing file. Throws the kinds of FileException, for files that cannot be updated too.
+    explicit FileEditor(const std::string& fileName);
+    // For a new file, which is made by AddFirstPage.
+    FileEditor(const std::string& fileName, const CreateOptions& oOptions);
+    ~FileEditor();
+    FileEditor(const FileEditor&) = delete;
+    FileEditor& operator=(const FileEditor&) = delete;
+
+    const std::string& GetFileName() const { return moFileName; }
+    const CreateOptions& GetOptions() const { return moOptions; }
+    const std::shared_ptr<support::File>& GetFile() const { return mpoFile; }
+    const FileHeader& GetHeader() const { return moHeader; }
+    // Whether the file has its pages, under whatever name.
+    bool HasPages() const { return !moPages.empty(); }
+    // Whether the file lies under its own name.
+    bool IsNamed() const { return mbNamed; }
+    std::vector<PageSummary> Summarise() const;
+    // The chain, then the pages that the first one lists.
+    const std::vector<std::shared_ptr<PageModel>>& GetPages() const { return moPages; }
+    const std::shared_ptr<PageModel>& GetPage(std::uint64_t nNumber, const Place& oPlace = Place::Current()) const;
+
+    // Lays a new file out. Decides between classic and big.
+    std::shared_ptr<PageModel> AddFirstPage(const NewImage& oImage, const Place& oPlace);
+    void AddPage(std::shared_ptr<PageModel> poPage);
+    void RemovePage(std::uint64_t nNumber);
+    // Puts other pages in the place of pages with the same numbers.
+    void ReplacePage(std::shared_ptr<PageModel> poPage);
+
+    // The page as readers see it, with the tags of this moment.
+    std::shared_ptr<Page> OpenPage(const std::shared_ptr<PageModel>& poPage);
+    // Brings the values of a tag into memory, and all of a page.
+    void Load(Tag& oTag);
+    void LoadTags(PageModel& oPage);
+
+    // Stores the bytes of a strip or tile: in the place of the old ones when the committed state does not use that.
+    void StoreStrile(PageModel& oPage, std::uint64_t nStrile, const unsigned char* pBytes, std::size_t nBytes);
+    // Gives an uncompressed strip or tile a place of its own, with what it held, so that rows may be written into it.
+    std::uint64_t OwnStrile(PageModel& oPage, std::uint64_t nStrile, std::size_t nBytes);
+
+    // Writers of pages are asked to store what they hold back by Synchronize.
+    void Register(const std::shared_ptr<PageWriter>& poWriter);
+
+    // Stores what the writers hold back.
+    void StoreHeld();
+
+    // Whether anything changed since the last Synchronize; blocks that are held back do not count.
+    bool IsChanged() const;
+    void Synchronize();
+    // Ends writing, without storing anything. Reading goes on.
+    void End();
+    bool IsEnded() const { return mbEnded; }
+    void CheckWritable(const Place& oPlace = Place::Current()) const;
+    // Ends writing and removes a new file that has not got its name.
+    void Discard() noexcept;
+
+private:
+    struct Written;
+
+    void ReadPages();
+    void ReadPage(std::uint64_t nOffset, bool bBelowFirst, std::uint64_t& nNext);
+    void ReadStriles(PageModel& oPage, const RawDirectory& oDirectory);
+    std::vector<std::uint64_t> ReadArray(const DirectoryEntry& oEntry);
+    void CreateFile(bool bBigTiff, bool bGap);
+    std::uint64_t GetReserve() const;
+    Written WriteDirectory(PageModel& oPage, std::uint64_t nNext, bool bDraft);
+    std::vector<Written> WriteDirectories();
+    void Commit(const std::vector<Written>& oWritten);
+    void ReleaseWritten(const std::vector<Written>& oWritten);
+    void Adopt(const Written& oWritten);
+    void ReleaseStriles(const PageModel& oPage);
+    [[noreturn]] void Fail(const std::string& what, const Place& oPlace = Place::Current()) const;
+
+    std::string moFileName;
+    CreateOptions moOptions;
+    std::string moTemporary; // of a new file, until it has its own name
+    std::shared_ptr<support::File> mpoFile;
+    FileHeader moHeader;
+    std::unique_ptr<Space> mpoSpace;
+    std::vector<std::shared_ptr<PageModel>> moPages;
+    std::vector<std::weak_ptr<PageWriter>> moWriters;
+    std::uint64_t mnNextNumber = 1;
+    std::vector<Extent> moReleased; // of pages that are gone
+    bool mbChanged = false;         // pages came or went
+    bool mbEnded = false;
+    bool mbNamed = true;
+};
+
+} // namespace krv::plugins::tif

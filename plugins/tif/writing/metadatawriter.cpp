@@ -1,0 +1,321 @@
+#include "plugins/tif/writing/metadatawriter.h"
+
+#include "plugins/tif/metadata.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <array>
+#include <charconv>
+#include <cmath>
+#include <optional>
+#include <sstream>
+#include <vector>
+
+#include <tiff.h>
+
+namespace krv::plugins::tif
+{
+
+namespace
+{
+
+using krv::datasources::AuxiliaryData;
+using krv::datasources::MetadataMap;
+
+constexpr std::uint16_t TAG_METADATA = 42112;
+constexpr std::uint16_t TAG_NO_DATA = 42113;
+constexpr std::uint16_t TAG_RPC = 50844;
+constexpr std::size_t RPC_VALUES = 92;
+constexpr std::size_t DATE_CHARACTERS = 19;
+constexpr std::size_t MAXIMUM_XMP_BYTES = std::size_t{1} << 20;
+constexpr std::size_t POINT_VALUES = 5;
+
+struct TextTag
+{
+    const char* mpKey;
+    std::uint16_t mnTag;
+};
+
+constexpr TextTag TEXTS[] = {{"ImageDescription", TIFFTAG_IMAGEDESCRIPTION},
+                             {"DocumentName", TIFFTAG_DOCUMENTNAME},
+                             {"PageName", TIFFTAG_PAGENAME},
+                             {"Make", TIFFTAG_MAKE},
+                             {"Model", TIFFTAG_MODEL},
+                             {"Software", TIFFTAG_SOFTWARE},
+                             {"DateTime", TIFFTAG_DATETIME},
+                             {"Artist", TIFFTAG_ARTIST},
+                             {"HostComputer", TIFFTAG_HOSTCOMPUTER},
+                             {"Copyright", TIFFTAG_COPYRIGHT},
+                             {"XMP", TIFFTAG_XMLPACKET},
+                             {"NO_DATA_VALUE", TAG_NO_DATA}};
+
+// Numbers separated by blanks that read back as the same text; no value for anything else.
+std::optional<std::vector<double>> ParseNumbers(const std::string& text)
+{
+    std::vector<double> oNumbers;
+    std::string again;
+    std::istringstream oWords(text);
+    for (std::string word; oWords >> word;)
+    {
+        double nValue = 0;
+        const char* pEnd = word.data() + word.size();
+        const auto oResult = std::from_chars(word.data(), pEnd, nValue);
+        if (oResult.ec != std::errc() || oResult.ptr != pEnd)
+            return std::nullopt;
+        oNumbers.push_back(nValue);
+        again += (again.empty() ? "" : " ") + NumberText(nValue);
+    }
+    return again == text ? std::optional(oNumbers) : std::nullopt;
+}
+
+} // namespace
+
+MetadataWriter::MetadataWriter(FileEditor& oEditor, std::shared_ptr<PageModel> poPage)
+    : moEditor(oEditor), mpoPage(poPage), moGeography(oEditor, poPage)
+{
+}
+
+void MetadataWriter::Write(const AuxiliaryData& oNew, const Place& oPlace)
+{
+    moEditor.LoadTags(*mpoPage);
+    const AuxiliaryData oOld = ReadMetadata(*moEditor.OpenPage(mpoPage));
+    if (oNew.GetChannelCount() != oOld.GetChannelCount())
+        throw DataException(moEditor.GetFileName() + ": the metadata are of " + std::to_string(oNew.GetChannelCount()) +
+                                " channels, the image has " + std::to_string(oOld.GetChannelCount()),
+                            oPlace);
+    FindChanges(oOld, oNew);
+    const MetadataKey oUnit{0, "ResolutionUnit"};
+    for (const MetadataKey& oKey : moChanged)
+        if (oKey.first == 0 && oKey != oUnit && StoreInTag(oKey.second, oNew.GetFileMetadataValue(oKey.second)))
+            moElsewhere.insert(oKey);
+    // It goes with the resolutions, which come first.
+    if (moChanged.contains(oUnit) && StoreUnit(oNew.GetFileMetadataValue(oUnit.second)))
+        moElsewhere.insert(oUnit);
+    StoreColours(oNew);
+    StoreItems(oNew);
+}
+
+void MetadataWriter::Compare(unsigned int nChannel, const MetadataMap& oOld, const MetadataMap& oNew)
+{
+    const auto Value = [](const MetadataMap& oMap, const std::string& key)
+    {
+        const auto oFound = oMap.find(key);
+        return oFound == oMap.end() ? std::string() : oFound->second;
+    };
+    for (const MetadataMap* pMap : {&oOld, &oNew})
+        for (const auto& [key, value] : *pMap)
+            if (Value(oOld, key) != Value(oNew, key) && !key.empty())
+                moChanged.insert({nChannel, key});
+}
+
+void MetadataWriter::FindChanges(const AuxiliaryData& oOld, const AuxiliaryData& oNew)
+{
+    Compare(0, oOld.GetFileMetadata(), oNew.GetFileMetadata());
+    for (unsigned int nChannel = 1; nChannel <= oNew.GetChannelCount(); ++nChannel)
+    {
+        Compare(nChannel, oOld.GetChanMetadata(nChannel), oNew.GetChanMetadata(nChannel));
+        if (oOld.GetChannelDescription(nChannel) != oNew.GetChannelDescription(nChannel))
+            moChanged.insert({nChannel, DESCRIPTION_KEY});
+    }
+}
+
+bool MetadataWriter::StoreInTag(const std::string& key, const std::string& value)
+{
+    if (key == "XResolution")
+        return StoreResolution(TIFFTAG_XRESOLUTION, value);
+    if (key == "YResolution")
+        return StoreResolution(TIFFTAG_YRESOLUTION, value);
+    if (key == "Orientation")
+        return StoreNumber(TIFFTAG_ORIENTATION, value, 2, 8);
+    if (key == "Photometric")
+        return StorePhotometric(value);
+    if (key == "RasterType")
+        return StoreRasterType(value);
+    if (key == "RPC")
+        return StoreRpc(value);
+    if (key == "GroundControlPoints")
+        return StorePoints(value);
+    return StoreText(key, value);
+}
+
+bool MetadataWriter::StoreText(const std::string& key, const std::string& value)
+{
+    for (const TextTag& oText : TEXTS)
+    {
+        if (key != oText.mpKey)
+            continue;
+        const bool bDate = oText.mnTag == TIFFTAG_DATETIME && !value.empty() && value.size() != DATE_CHARACTERS;
+        const bool bLong = oText.mnTag == TIFFTAG_XMLPACKET && value.size() > MAXIMUM_XMP_BYTES;
+        if (bDate || bLong || value.find('\0') != std::string::npos)
+        {
+            mpoPage->moTags.Remove(oText.mnTag);
+            return false;
+        }
+        if (oText.mnTag == TIFFTAG_XMLPACKET && !value.empty())
+            mpoPage->moTags.SetBytes(oText.mnTag, TIFF_BYTE, value);
+        else
+            mpoPage->moTags.SetText(oText.mnTag, value);
+        return true;
+    }
+    return false;
+}
+
+// A fraction that gives the same number as the text: whole, or over a power of two or ten.
+bool MetadataWriter::StoreResolution(std::uint16_t nTag, const std::string& value)
+{
+    mpoPage->moTags.Remove(nTag);
+    if (value.empty())
+        return true;
+    const std::optional<std::vector<double>> oNumbers = ParseNumbers(value);
+    if (!oNumbers || oNumbers->size() != 1 || !(oNumbers->front() >= 0))
+        return false;
+    for (const double nBase : {10.0, 2.0})
+        for (double nBelow = 1; nBelow <= 1e9; nBelow *= nBase)
+        {
+            const double nAbove = std::nearbyint(oNumbers->front() * nBelow);
+            if (nAbove > UINT32_MAX)
+                break;
+            if (NumberText(static_cast<float>(nAbove / nBelow)) != value)
+                continue;
+            Tag oTag{nTag, TIFF_RATIONAL, 1, {}, {}};
+            AppendNumber(oTag.moBytes, static_cast<std::uint64_t>(nAbove), 4, mpoPage->moTags.IsBigEndian());
+            AppendNumber(oTag.moBytes, static_cast<std::uint64_t>(nBelow), 4, mpoPage->moTags.IsBigEndian());
+            mpoPage->moTags.Set(std::move(oTag));
+            return true;
+        }
+    return false;
+}
+
+bool MetadataWriter::StoreUnit(const std::string& value)
+{
+    constexpr std::array<const char*, 4> UNITS = {"", "none", "inch", "centimetre"};
+    mpoPage->moTags.Remove(TIFFTAG_RESOLUTIONUNIT);
+    const bool bUsed =
+        mpoPage->moTags.Find(TIFFTAG_XRESOLUTION) != nullptr || mpoPage->moTags.Find(TIFFTAG_YRESOLUTION) != nullptr;
+    for (std::size_t nUnit = 1; bUsed && nUnit < UNITS.size(); ++nUnit)
+        if (value == UNITS[nUnit])
+        {
+            mpoPage->moTags.SetNumber(TIFFTAG_RESOLUTIONUNIT, TIFF_SHORT, nUnit);
+            return true;
+        }
+    return value.empty();
+}
+
+bool MetadataWriter::StoreNumber(std::uint16_t nTag, const std::string& value, unsigned int nFrom, unsigned int nTo)
+{
+    mpoPage->moTags.Remove(nTag);
+    for (unsigned int nNumber = nFrom; nNumber <= nTo; ++nNumber)
+        if (value == std::to_string(nNumber))
+        {
+            mpoPage->moTags.SetNumber(nTag, TIFF_SHORT, nNumber);
+            return true;
+        }
+    return value.empty();
+}
+
+// How stored values are to be seen, as long as the colours keep their number: values themselves never change.
+bool MetadataWriter::StorePhotometric(const std::string& value)
+{
+    TagList& oTags = mpoPage->moTags;
+    const std::uint64_t nOld = oTags.GetNumber(TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
+    const bool bGrey = nOld == PHOTOMETRIC_MINISBLACK || nOld == PHOTOMETRIC_MINISWHITE;
+    if (!bGrey || (value != "MinIsWhite" && !value.empty()))
+        return false;
+    oTags.SetNumber(TIFFTAG_PHOTOMETRIC, TIFF_SHORT, value.empty() ? PHOTOMETRIC_MINISBLACK : PHOTOMETRIC_MINISWHITE);
+    return true;
+}
+
+bool MetadataWriter::StoreRasterType(const std::string& value)
+{
+    if (value == "Area" || value == "Point")
+        moGeography.SetRasterType(value == "Point");
+    else
+        moGeography.RemoveRasterType();
+    return value == "Area" || value == "Point" || value.empty();
+}
+
+bool MetadataWriter::StoreRpc(const std::string& value)
+{
+    mpoPage->moTags.Remove(TAG_RPC);
+    const std::optional<std::vector<double>> oNumbers = ParseNumbers(value);
+    if (value.empty() || !oNumbers || oNumbers->size() != RPC_VALUES)
+        return value.empty();
+    mpoPage->moTags.SetDoubles(TAG_RPC, *oNumbers);
+    return true;
+}
+
+bool MetadataWriter::StorePoints(const std::string& value)
+{
+    krv::ogc::cs::GeocodingInfo oInfo;
+    if (ReadGeocoding(moEditor.OpenPage(mpoPage)->GetTiff(), oInfo))
+        return value.empty();
+    std::vector<TiePoint> oPoints;
+    std::istringstream oParts(value);
+    for (std::string part; std::getline(oParts, part, ';');)
+    {
+        const std::size_t nBlank = oPoints.empty() ? 0 : 1;
+        const std::optional<std::vector<double>> oNumbers =
+            ParseNumbers(part.size() >= nBlank ? part.substr(nBlank) : part);
+        if (!oNumbers || oNumbers->size() != POINT_VALUES)
+            return false;
+        oPoints.push_back({(*oNumbers)[0], (*oNumbers)[1], (*oNumbers)[2], (*oNumbers)[3], (*oNumbers)[4]});
+    }
+    moGeography.SetTiePoints(oPoints);
+    return ReadMetadata(*moEditor.OpenPage(mpoPage)).GetFileMetadataValue("GroundControlPoints") == value;
+}
+
+// Alpha is said by the kind of an extra channel; one channel has it at most.
+bool MetadataWriter::StoreAlpha(unsigned int nChannel, const std::string& colour, const std::string& kind)
+{
+    TagList& oTags = mpoPage->moTags;
+    std::vector<std::uint64_t> oExtra = oTags.GetNumbers(TIFFTAG_EXTRASAMPLES);
+    const std::uint64_t nChannels = oTags.GetNumber(TIFFTAG_SAMPLESPERPIXEL, 1);
+    if (oExtra.size() > nChannels || nChannel <= nChannels - oExtra.size())
+        return false;
+    std::uint64_t& nKind = oExtra[nChannel - 1 - (nChannels - oExtra.size())];
+    const std::uint64_t nWanted = colour != "Alpha"         ? EXTRASAMPLE_UNSPECIFIED
+                                  : kind == "Premultiplied" ? EXTRASAMPLE_ASSOCALPHA
+                                                            : EXTRASAMPLE_UNASSALPHA;
+    const bool bKnownKind = kind == "Premultiplied" || kind == "Straight";
+    if (nKind == nWanted)
+        return false;
+    nKind = EXTRASAMPLE_UNSPECIFIED;
+    for (const std::uint64_t nOther : oExtra)
+        if (nOther != EXTRASAMPLE_UNSPECIFIED && nWanted != EXTRASAMPLE_UNSPECIFIED)
+            return false;
+    nKind = nWanted;
+    oTags.SetNumbers(TIFFTAG_EXTRASAMPLES, TIFF_SHORT, oExtra);
+    return colour == "Alpha" && bKnownKind;
+}
+
+void MetadataWriter::StoreColours(const AuxiliaryData& oNew)
+{
+    for (unsigned int nChannel = 1; nChannel <= oNew.GetChannelCount(); ++nChannel)
+    {
+        const MetadataKey oColour{nChannel, "ColorInterp"};
+        const MetadataKey oKind{nChannel, "AlphaKind"};
+        if (!moChanged.contains(oColour) && !moChanged.contains(oKind))
+            continue;
+        if (StoreAlpha(nChannel, oNew.GetChanMetadataValue("ColorInterp", nChannel),
+                       oNew.GetChanMetadataValue("AlphaKind", nChannel)))
+            moElsewhere.insert({oColour, oKind});
+    }
+}
+
+void MetadataWriter::StoreItems(const AuxiliaryData& oNew)
+{
+    if (moChanged.empty())
+        return;
+    // A text that is no XML was handed out as a value of its own and is taken back the same way.
+    const std::string text = ReadText(moEditor.OpenPage(mpoPage)->GetTiff(), TAG_METADATA);
+    const bool bForeign = !text.empty() && !IsItemText(text);
+    if (bForeign && oNew.GetFileMetadataValue("MetadataXML") == text && moChanged == moElsewhere)
+        return;
+    std::set<MetadataKey> oChanged = moChanged;
+    if (bForeign)
+        oChanged.insert({0, "MetadataXML"});
+    const std::string edited = EditItems(bForeign ? std::string() : text, oNew, oChanged, moElsewhere);
+    if (edited != text)
+        mpoPage->moTags.SetText(TAG_METADATA, edited);
+}
+
+} // namespace krv::plugins::tif

@@ -1,0 +1,53 @@
+#pragma once
+
+#include "datasources/metadata/auxiliarydata.h"
+#include "plugins/tif/writing/fileeditor.h"
+#include "plugins/tif/writing/geowriter.h"
+#include "plugins/tif/writing/metadataitems.h"
+
+#include <memory>
+#include <set>
+#include <string>
+
+namespace krv::plugins::tif
+{
+
+// Stores a record in the tags of a page so that ReadMetadata gives it back. Only what differs from the page's record is
+// touched. Values go into the tag that ReadMetadata takes them from, when it can hold them exactly; everything else
+// becomes an item of tag 42112. An empty value counts as none. What the form of the pixels says by itself (colours)
+// cannot be taken away, only said otherwise.
+class MetadataWriter
+{
+public:
+    // The editor outlives it.
+    MetadataWriter(FileEditor& oEditor, std::shared_ptr<PageModel> poPage);
+
+    // Throws DataException for a record of another channel count.
+    void Write(const krv::datasources::AuxiliaryData& oNew, const Place& oPlace);
+
+private:
+    void FindChanges(const krv::datasources::AuxiliaryData& oOld, const krv::datasources::AuxiliaryData& oNew);
+    void Compare(unsigned int nChannel, const krv::datasources::MetadataMap& oOld,
+                 const krv::datasources::MetadataMap& oNew);
+    // Whether a tag of its own says the value now, so that no item has to.
+    bool StoreInTag(const std::string& key, const std::string& value);
+    bool StoreText(const std::string& key, const std::string& value);
+    bool StoreResolution(std::uint16_t nTag, const std::string& value);
+    bool StoreUnit(const std::string& value);
+    bool StoreNumber(std::uint16_t nTag, const std::string& value, unsigned int nFrom, unsigned int nTo);
+    bool StorePhotometric(const std::string& value);
+    bool StoreRasterType(const std::string& value);
+    bool StoreRpc(const std::string& value);
+    bool StorePoints(const std::string& value);
+    bool StoreAlpha(unsigned int nChannel, const std::string& colour, const std::string& kind);
+    void StoreColours(const krv::datasources::AuxiliaryData& oNew);
+    void StoreItems(const krv::datasources::AuxiliaryData& oNew);
+
+    FileEditor& moEditor;
+    std::shared_ptr<PageModel> mpoPage;
+    GeoWriter moGeography;
+    std::set<MetadataKey> moChanged;
+    std::set<MetadataKey> moElsewhere;
+};
+
+} // namespace krv::plugins::tif

@@ -1,0 +1,72 @@
+#pragma once
+
+#include "plugins/tif/pagelist.h"
+#include "plugins/tif/striletable.h"
+#include "plugins/tif/writing/createoptions.h"
+#include "plugins/tif/writing/taglist.h"
+
+#include "gobs/raster/datatype.h"
+
+#include <cstdint>
+#include <memory>
+#include <vector>
+
+namespace krv::plugins::tif
+{
+
+// A page of a file that is being written: its tags, where its strips or tiles lie, and what of it stands in the file.
+class PageModel : public IStrileIndex
+{
+public:
+    explicit PageModel(bool bBigEndian) : moTags(bBigEndian) {}
+    ~PageModel() override;
+
+    Strile Get(std::uint64_t nIndex) const override;
+
+    std::uint64_t GetStriles() const { return moOffsets.size(); }
+    void SetStriles(std::uint64_t nStriles);
+    // In terms of the tags: geometry and role; its offset is the page's number.
+    PageSummary Summarise() const;
+    bool IsTiled() const { return moTags.Find(322) != nullptr; }
+    bool IsChanged() const { return moTags.IsChanged() || mbStrilesChanged || moDirectory.mnBytes == 0; }
+    // Strips or tiles that the tags call for.
+    std::uint64_t CountStriles() const;
+
+    std::uint64_t mnNumber = 0; // stays with the page
+    TagList moTags;
+    std::vector<std::uint64_t> moOffsets;
+    std::vector<std::uint64_t> moByteCounts;
+    std::vector<std::uint64_t> moRoom;        // bytes taken in the file
+    std::vector<std::uint32_t> moGenerations; // of the space that each takes
+    bool mbStrilesChanged = false;
+    bool mbArraysStale = false; // the arrays in the file are of other types than are written here
+    bool mbBelowFirst = false;  // listed by the first page, not in the chain
+
+    // In the file: the directory that belongs to the committed state, one written ahead for reading, and the arrays.
+    Extent moDirectory;
+    std::uint64_t mnNext = 0; // that the committed directory names
+    Extent moDraft;
+    Extent moOffsetArray;
+    Extent moCountArray;
+};
+
+// The image that a new file begins with.
+struct NewImage
+{
+    std::uint32_t mnWidth = 0;
+    std::uint32_t mnHeight = 0;
+    std::uint16_t mnChannels = 1;
+    krv::gobs::DataType moType;
+};
+
+// The page of a new image. Throws DataException for a type or a codec that do not go together.
+std::shared_ptr<PageModel> MakeImagePage(const NewImage& oImage, const CreateOptions& oOptions, bool bBigEndian,
+                                         const Place& oPlace);
+
+// A page of another size with the layout, the samples and the codec of a page whose tags are all in memory: a level.
+std::shared_ptr<PageModel> MakeReducedPage(const PageModel& oFull, std::uint32_t nWidth, std::uint32_t nHeight);
+
+// A page of bits beside another: a bitmap.
+std::shared_ptr<PageModel> MakeMaskPage(const PageModel& oImage);
+
+} // namespace krv::plugins::tif

@@ -1,0 +1,218 @@
+#include "plugins/tif/writing/pagewriter.h"
+
+#include "plugins/support/codec/interleave.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <algorithm>
+#include <utility>
+
+namespace krv::plugins::tif
+{
+
+namespace
+{
+
+constexpr std::uint64_t LEAST_HELD_BYTES = std::uint64_t{16} << 20;
+constexpr std::uint64_t MOST_HELD_BYTES = std::uint64_t{256} << 20;
+// Uncompressed strips and tiles above this size get rows written into them instead of being held.
+constexpr std::uint64_t IN_PLACE_BYTES = std::uint64_t{8} << 20;
+
+support::PixelRect Intersect(const support::PixelRect& oFirst, const support::PixelRect& oSecond)
+{
+    const unsigned int nX = std::max(oFirst.mnX, oSecond.mnX);
+    const unsigned int nY = std::max(oFirst.mnY, oSecond.mnY);
+    const unsigned int nRight = std::min(oFirst.mnX + oFirst.mnWidth, oSecond.mnX + oSecond.mnWidth);
+    const unsigned int nBottom = std::min(oFirst.mnY + oFirst.mnHeight, oSecond.mnY + oSecond.mnHeight);
+    if (nRight <= nX || nBottom <= nY)
+        return {};
+    return {nX, nY, nRight - nX, nBottom - nY};
+}
+
+} // namespace
+
+EditedSource::~EditedSource() = default;
+
+// Two rows of blocks, so that an image that comes row by row encodes every block once.
+PageWriter::PageWriter(std::shared_ptr<FileEditor> poEditor, std::shared_ptr<PageModel> poModel,
+                       std::shared_ptr<Page> poPage, PixelUse eUse)
+    : mpoEditor(std::move(poEditor)), mpoModel(std::move(poModel)), mpoPage(std::move(poPage)),
+      moForm(mpoPage->GetForm()), moReader(mpoPage, eUse), moEncoder(*mpoPage, eUse, mpoEditor->GetOptions().moLevel)
+{
+    const std::uint64_t nRow = std::uint64_t{moForm.mnWidth} * GetPixelBytes() * moForm.GetPlanes();
+    const std::uint64_t nRows = std::uint64_t{2} * moForm.mnStrileHeight;
+    mnBound = static_cast<std::size_t>(
+        std::clamp(nRow > MOST_HELD_BYTES ? MOST_HELD_BYTES : nRow * std::min(nRows, MOST_HELD_BYTES), LEAST_HELD_BYTES,
+                   MOST_HELD_BYTES));
+}
+
+PageWriter::~PageWriter() = default;
+
+// The strips or tiles that a rectangle of the image touches.
+template <typename Action>
+void PageWriter::ForEach(unsigned int nPlane, const support::PixelRect& oRect, Action oAction) const
+{
+    const unsigned int nRight = (oRect.mnX + oRect.mnWidth - 1) / moForm.mnStrileWidth;
+    const unsigned int nBottom = (oRect.mnY + oRect.mnHeight - 1) / moForm.mnStrileHeight;
+    for (unsigned int nRow = oRect.mnY / moForm.mnStrileHeight; nRow <= nBottom; ++nRow)
+        for (unsigned int nColumn = oRect.mnX / moForm.mnStrileWidth; nColumn <= nRight; ++nColumn)
+        {
+            const unsigned int nX = nColumn * moForm.mnStrileWidth;
+            const unsigned int nY = nRow * moForm.mnStrileHeight;
+            const Strile oStrile{(std::uint64_t{nPlane} * moForm.mnStrilesDown + nRow) * moForm.mnStrilesAcross +
+                                     nColumn,
+                                 nPlane,
+                                 {nX, nY, std::min(moForm.mnStrileWidth, moForm.mnWidth - nX),
+                                  std::min(moForm.mnStrileHeight, moForm.mnHeight - nY)},
+                                 moForm.GetStrileRows(nRow)};
+            oAction(oStrile);
+        }
+}
+
+support::PixelRect PageWriter::ToImage(const support::BlockAddress& oBlock, const support::PixelRect& oPart) const
+{
+    return {oBlock.mnColumn * GetLayout().GetBlockWidth() + oPart.mnX,
+            oBlock.mnRow * GetLayout().GetBlockHeight() + oPart.mnY, oPart.mnWidth, oPart.mnHeight};
+}
+
+void PageWriter::Read(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
+                      std::size_t nPitch)
+{
+    moReader.ReadBlock(oBlock, oPart, pTarget, nPitch);
+    if (moHeld.empty())
+        return;
+    const support::PixelRect oRect = ToImage(oBlock, oPart);
+    ForEach(oBlock.mnPlane, oRect,
+            [&](const Strile& oStrile)
+            {
+                const auto oFound = moIndex.find(oStrile.mnNumber);
+                if (oFound == moIndex.end())
+                    return;
+                const support::PixelRect oShared = Intersect(oRect, oStrile.moRect);
+                const std::size_t nHeldPitch = oStrile.moRect.mnWidth * GetPixelBytes();
+                codec::CopyRows(oFound->second->moPixels.data() + (oShared.mnY - oStrile.moRect.mnY) * nHeldPitch +
+                                    (oShared.mnX - oStrile.moRect.mnX) * GetPixelBytes(),
+                                nHeldPitch,
+                                pTarget + (oShared.mnY - oRect.mnY) * nPitch +
+                                    (oShared.mnX - oRect.mnX) * GetPixelBytes(),
+                                nPitch, oShared.mnWidth * GetPixelBytes(), oShared.mnHeight);
+            });
+}
+
+void PageWriter::Write(const support::BlockAddress& oBlock, const support::PixelRect& oPart,
+                       const unsigned char* pSource, std::size_t nPitch)
+{
+    mpoEditor->CheckWritable();
+    moEncoder.CheckWritable();
+    if (moOnChange)
+        std::exchange(moOnChange, nullptr)();
+    const support::PixelRect oRect = ToImage(oBlock, oPart);
+    ForEach(oBlock.mnPlane, oRect,
+            [&](const Strile& oStrile)
+            {
+                const support::PixelRect oShared = Intersect(oRect, oStrile.moRect);
+                WritePart(oStrile, oShared,
+                          pSource + (oShared.mnY - oRect.mnY) * nPitch + (oShared.mnX - oRect.mnX) * GetPixelBytes(),
+                          nPitch);
+            });
+}
+
+void PageWriter::WritePart(const Strile& oStrile, const support::PixelRect& oPart, const unsigned char* pSource,
+                           std::size_t nPitch)
+{
+    if (oPart == oStrile.moRect)
+    {
+        Store(oStrile, pSource, nPitch);
+        return Forget(oStrile.mnNumber);
+    }
+    const std::uint64_t nBytes = std::uint64_t{oStrile.moRect.mnWidth} * oStrile.moRect.mnHeight * GetPixelBytes();
+    if (nBytes > IN_PLACE_BYTES && moEncoder.IsPlain())
+        return WriteInPlace(oStrile, oPart, pSource, nPitch);
+    Held& oHeld = Hold(oStrile);
+    const std::size_t nHeldPitch = oStrile.moRect.mnWidth * GetPixelBytes();
+    codec::CopyRows(pSource, nPitch,
+                    oHeld.moPixels.data() + (oPart.mnY - oStrile.moRect.mnY) * nHeldPitch +
+                        (oPart.mnX - oStrile.moRect.mnX) * GetPixelBytes(),
+                    nHeldPitch, oPart.mnWidth * GetPixelBytes(), oPart.mnHeight);
+}
+
+void PageWriter::WriteInPlace(const Strile& oStrile, const support::PixelRect& oPart, const unsigned char* pSource,
+                              std::size_t nPitch)
+{
+    const std::size_t nStoredPitch = moForm.GetStoredRowBytes(moForm.mnStrileWidth);
+    const std::uint64_t nOffset =
+        mpoEditor->OwnStrile(*mpoModel, oStrile.mnNumber, nStoredPitch * oStrile.mnStoredRows);
+    mpoEditor->GetFile()->WriteRows(nOffset + (oPart.mnY - oStrile.moRect.mnY) * nStoredPitch +
+                                        (oPart.mnX - oStrile.moRect.mnX) * GetPixelBytes(),
+                                    nStoredPitch, oPart.mnWidth * GetPixelBytes(), oPart.mnHeight, pSource, nPitch);
+    moReader.Forget();
+}
+
+void PageWriter::Store(const Strile& oStrile, const unsigned char* pPixels, std::size_t nPitch)
+{
+    const std::span<const unsigned char> oBytes =
+        moEncoder.Encode(pPixels, nPitch, oStrile.moRect.mnWidth, oStrile.moRect.mnHeight, oStrile.mnStoredRows);
+    mpoEditor->StoreStrile(*mpoModel, oStrile.mnNumber, oBytes.data(), oBytes.size());
+    moReader.Forget();
+}
+
+void PageWriter::ReadStored(const Strile& oStrile, unsigned char* pTarget, std::size_t nPitch)
+{
+    const support::ImageLayout& oLayout = GetLayout();
+    const unsigned int nColumn = oStrile.moRect.mnX / oLayout.GetBlockWidth();
+    for (unsigned int nDone = 0; nDone < oStrile.moRect.mnHeight;)
+    {
+        const unsigned int nY = oStrile.moRect.mnY + nDone;
+        const unsigned int nBlock = nY / oLayout.GetBlockHeight();
+        const unsigned int nSkip = nY - nBlock * oLayout.GetBlockHeight();
+        const unsigned int nRows = std::min(oStrile.moRect.mnHeight - nDone, oLayout.GetBlockHeight() - nSkip);
+        moReader.ReadBlock({oStrile.mnPlane, nColumn, nBlock}, {0, nSkip, oStrile.moRect.mnWidth, nRows},
+                           pTarget + nDone * nPitch, nPitch);
+        nDone += nRows;
+    }
+}
+
+PageWriter::Held& PageWriter::Hold(const Strile& oStrile)
+{
+    const auto oFound = moIndex.find(oStrile.mnNumber);
+    if (oFound != moIndex.end())
+    {
+        moHeld.splice(moHeld.begin(), moHeld, oFound->second);
+        return moHeld.front();
+    }
+    const std::size_t nPitch = oStrile.moRect.mnWidth * GetPixelBytes();
+    const std::size_t nBytes = nPitch * oStrile.moRect.mnHeight;
+    while (!moHeld.empty() && mnHeldBytes + nBytes > mnBound)
+        StoreOldest();
+    Held oHeld{oStrile, std::vector<unsigned char>(nBytes)};
+    if (mpoModel->moByteCounts[oStrile.mnNumber] != 0)
+        ReadStored(oStrile, oHeld.moPixels.data(), nPitch);
+    moHeld.push_front(std::move(oHeld));
+    moIndex[oStrile.mnNumber] = moHeld.begin();
+    mnHeldBytes += nBytes;
+    return moHeld.front();
+}
+
+void PageWriter::StoreOldest()
+{
+    const Held& oHeld = moHeld.back();
+    Store(oHeld.moStrile, oHeld.moPixels.data(), oHeld.moStrile.moRect.mnWidth * GetPixelBytes());
+    Forget(oHeld.moStrile.mnNumber);
+}
+
+void PageWriter::Forget(std::uint64_t nStrile)
+{
+    const auto oFound = moIndex.find(nStrile);
+    if (oFound == moIndex.end())
+        return;
+    mnHeldBytes -= oFound->second->moPixels.size();
+    moHeld.erase(oFound->second);
+    moIndex.erase(oFound);
+}
+
+void PageWriter::Flush()
+{
+    while (!moHeld.empty())
+        StoreOldest();
+}
+
+} // namespace krv::plugins::tif

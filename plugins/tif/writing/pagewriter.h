@@ -1,0 +1,113 @@
+#pragma once
+
+#include "plugins/support/iblocksource.h"
+#include "plugins/tif/strilesource.h"
+#include "plugins/tif/writing/fileeditor.h"
+#include "plugins/tif/writing/strileencoder.h"
+
+#include <cstdint>
+#include <functional>
+#include <list>
+#include <memory>
+#include <optional>
+#include <unordered_map>
+
+namespace krv::plugins::tif
+{
+
+// Reads and writes the pixels of one page of a file that is being written. Strips and tiles that come whole are encoded
+// at once; of others the pixels are held back, bounded in bytes, until they have to make room or the file is
+// synchronised. One thread at a time.
+class PageWriter
+{
+public:
+    PageWriter(std::shared_ptr<FileEditor> poEditor, std::shared_ptr<PageModel> poModel, std::shared_ptr<Page> poPage,
+               PixelUse eUse);
+    ~PageWriter();
+    PageWriter(const PageWriter&) = delete;
+    PageWriter& operator=(const PageWriter&) = delete;
+
+    const support::ImageLayout& GetLayout() const { return moReader.GetLayout(); }
+    bool ReadsParts() const { return moReader.ReadsParts(); }
+    std::string GetName() const { return mpoEditor->GetFileName(); }
+    PageModel& GetModel() { return *mpoModel; }
+
+    void Read(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
+              std::size_t nPitch);
+    void Write(const support::BlockAddress& oBlock, const support::PixelRect& oPart, const unsigned char* pSource,
+               std::size_t nPitch);
+    // Stores what is held back.
+    void Flush();
+
+    // Called before the first change after it is set.
+    void OnChange(std::function<void()> oCall) { moOnChange = std::move(oCall); }
+
+private:
+    // A strip or tile: its number, and the part of the image that it holds.
+    struct Strile
+    {
+        std::uint64_t mnNumber;
+        unsigned int mnPlane;
+        support::PixelRect moRect;
+        std::uint32_t mnStoredRows;
+    };
+
+    struct Held
+    {
+        Strile moStrile;
+        std::vector<unsigned char> moPixels; // of the part in the image
+    };
+
+    template <typename Action>
+    void ForEach(unsigned int nPlane, const support::PixelRect& oRect, Action oAction) const;
+    support::PixelRect ToImage(const support::BlockAddress& oBlock, const support::PixelRect& oPart) const;
+    void WritePart(const Strile& oStrile, const support::PixelRect& oPart, const unsigned char* pSource,
+                   std::size_t nPitch);
+    void WriteInPlace(const Strile& oStrile, const support::PixelRect& oPart, const unsigned char* pSource,
+                      std::size_t nPitch);
+    void Store(const Strile& oStrile, const unsigned char* pPixels, std::size_t nPitch);
+    Held& Hold(const Strile& oStrile);
+    void ReadStored(const Strile& oStrile, unsigned char* pTarget, std::size_t nPitch);
+    void StoreOldest();
+    void Forget(std::uint64_t nStrile);
+    std::size_t GetPixelBytes() const { return GetLayout().GetPixelBytes(0); }
+
+    std::shared_ptr<FileEditor> mpoEditor;
+    std::shared_ptr<PageModel> mpoModel;
+    std::shared_ptr<Page> mpoPage;
+    const PageForm& moForm;
+    StrileSource moReader;
+    StrileEncoder moEncoder;
+    std::size_t mnBound;
+    std::size_t mnHeldBytes = 0;
+    std::list<Held> moHeld; // the one used last first
+    std::unordered_map<std::uint64_t, std::list<Held>::iterator> moIndex;
+    std::function<void()> moOnChange;
+};
+
+// A page that is being written as the source of a block image.
+class EditedSource : public support::IBlockSource
+{
+public:
+    explicit EditedSource(std::shared_ptr<PageWriter> poWriter) : mpoWriter(std::move(poWriter)) {}
+    ~EditedSource() override;
+
+    const support::ImageLayout& GetLayout() const override { return mpoWriter->GetLayout(); }
+    void ReadBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
+                   std::size_t nPitch) override
+    {
+        mpoWriter->Read(oBlock, oPart, pTarget, nPitch);
+    }
+    bool ReadsParts() const override { return mpoWriter->ReadsParts(); }
+    void WriteBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, const unsigned char* pSource,
+                    std::size_t nPitch) override
+    {
+        mpoWriter->Write(oBlock, oPart, pSource, nPitch);
+    }
+    std::string GetName() const override { return mpoWriter->GetName(); }
+
+private:
+    std::shared_ptr<PageWriter> mpoWriter;
+};
+
+} // namespace krv::plugins::tif

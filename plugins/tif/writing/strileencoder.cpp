@@ -1,0 +1,221 @@
+#include "plugins/tif/writing/strileencoder.h"
+
+#include "plugins/support/codec/bits.h"
+#include "plugins/support/codec/interleave.h"
+#include "plugins/support/codec/predictor.h"
+#include "plugins/tif/writing/createoptions.h"
+#include "plugins/tif/writing/librarycodec.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <algorithm>
+#include <bit>
+#include <cstring>
+
+#include <tiff.h>
+
+namespace krv::plugins::tif
+{
+
+namespace
+{
+
+constexpr bool BIG_ENDIAN_MACHINE = std::endian::native == std::endian::big;
+constexpr unsigned int MOST_PACKED_BITS = 32;
+
+bool IsDeflate(std::uint16_t nCompression)
+{
+    return nCompression == COMPRESSION_DEFLATE || nCompression == COMPRESSION_ADOBE_DEFLATE;
+}
+
+bool IsOwnCodec(std::uint16_t nCompression)
+{
+    return IsDeflate(nCompression) || nCompression == COMPRESSION_LZW || nCompression == COMPRESSION_ZSTD;
+}
+
+// Codecs of libtiff that need nothing but the tags of the page.
+bool IsLibraryCodec(std::uint16_t nCompression)
+{
+    return nCompression == COMPRESSION_PACKBITS || nCompression == COMPRESSION_LZMA || nCompression == COMPRESSION_JPEG;
+}
+
+std::int64_t ReadSample(const unsigned char* pSample, std::size_t nBytes, bool bSigned)
+{
+    std::uint64_t nValue = 0;
+    std::memcpy(&nValue, pSample, nBytes);
+    if (bSigned && nBytes < 8 && (nValue >> (8 * nBytes - 1) & 1) != 0)
+        nValue |= ~std::uint64_t{0} << 8 * nBytes;
+    return static_cast<std::int64_t>(nValue);
+}
+
+} // namespace
+
+StrileEncoder::StrileEncoder(Page& oPage, PixelUse eUse, std::optional<int> oLevel)
+    : moPage(oPage), moForm(oPage.GetForm()), meUse(eUse), moLevel(oLevel)
+{
+    const std::uint16_t nCompression = moForm.mnCompression;
+    if (IsDeflate(nCompression))
+        mpoDeflate = std::make_unique<codec::DeflateEncoder>(moLevel.value_or(codec::DeflateEncoder::DEFAULT_LEVEL));
+    else if (nCompression == COMPRESSION_ZSTD)
+        mpoZstd = std::make_unique<codec::ZstdEncoder>(moLevel.value_or(codec::ZstdEncoder::DEFAULT_LEVEL));
+    else if (nCompression == COMPRESSION_LZW)
+        mpoLzw = std::make_unique<codec::LzwEncoder>();
+}
+
+StrileEncoder::~StrileEncoder() = default;
+
+std::string StrileEncoder::FindObstacle() const
+{
+    const SampleForm& oSample = moForm.moSample;
+    const bool bPacked = oSample.meWidening == Widening::eBits && oSample.mnPartBits <= MOST_PACKED_BITS &&
+                         oSample.mnParts == 1 && oSample.mnPartBits % 8 != 0;
+    if (moForm.mbReversedBits)
+        return "bytes with their lowest bit first";
+    if (oSample.meWidening != Widening::eNone && !(bPacked && moForm.mnPredictor == PREDICTOR_NONE))
+        return "samples of " + std::to_string(oSample.GetBits()) + " bits";
+    if (moForm.mnCompression != COMPRESSION_NONE && !IsOwnCodec(moForm.mnCompression) &&
+        !(IsLibraryCodec(moForm.mnCompression) && TIFFIsCODECConfigured(moForm.mnCompression) != 0))
+        return "the compression " + std::to_string(moForm.mnCompression);
+    return {};
+}
+
+void StrileEncoder::CheckWritable(const Place& oPlace) const
+{
+    const std::string obstacle = FindObstacle();
+    if (!obstacle.empty())
+        throw DataException(moPage.GetFileName() + ": pixels cannot be written with " + obstacle, oPlace);
+}
+
+bool StrileEncoder::IsPlain() const
+{
+    const bool bOrdered = moForm.mbBigEndian == BIG_ENDIAN_MACHINE || moForm.moSample.GetPartBytes() == 1;
+    return moForm.mnCompression == COMPRESSION_NONE && moForm.moSample.meWidening == Widening::eNone && bOrdered &&
+           meUse == PixelUse::eImage;
+}
+
+// Values of other widths than whole bytes: packed, most significant bit first; what does not fit becomes the nearest
+// value that does.
+StrileEncoder::Rows StrileEncoder::Narrow(const Rows& oRows, std::uint32_t nWidth, std::uint32_t nRows)
+{
+    const SampleForm& oSample = moForm.moSample;
+    const bool bMask = meUse == PixelUse::eBitmap;
+    if (oSample.meWidening == Widening::eNone && !bMask)
+        return oRows;
+    const std::size_t nSamples = std::size_t{nWidth} * moForm.GetPlaneChannels();
+    const std::size_t nValueBytes = bMask ? 1 : oSample.GetValueBytes();
+    const std::size_t nPitch = moForm.GetStoredRowBytes(nWidth);
+    const unsigned int nBits = oSample.GetBits();
+    const std::int64_t nHighest = (std::int64_t{1} << (nBits - (oSample.IsSigned() ? 1 : 0))) - 1;
+    const std::int64_t nLowest = oSample.IsSigned() ? -nHighest - 1 : 0;
+    unsigned char* pTarget = moNarrow.Get(nPitch * nRows);
+    std::memset(pTarget, 0, nPitch * nRows);
+    for (std::uint32_t nRow = 0; nRow < nRows; ++nRow)
+    {
+        const unsigned char* pRow = oRows.mpFirst + nRow * oRows.mnPitch;
+        std::uint64_t nPending = 0;
+        unsigned int nHeld = 0;
+        unsigned char* pNext = pTarget + nRow * nPitch;
+        for (std::size_t nAt = 0; nAt < nSamples; ++nAt)
+        {
+            const std::int64_t nValue = ReadSample(pRow + nAt * nValueBytes, nValueBytes, oSample.IsSigned());
+            const std::int64_t nFitted = bMask ? (nValue != 0 ? nHighest : 0) : std::clamp(nValue, nLowest, nHighest);
+            nPending = nPending << nBits | (static_cast<std::uint64_t>(nFitted) & ((std::uint64_t{1} << nBits) - 1));
+            for (nHeld += nBits; nHeld >= 8; nHeld -= 8)
+                *pNext++ = static_cast<unsigned char>(nPending >> (nHeld - 8));
+        }
+        if (nHeld > 0)
+            *pNext = static_cast<unsigned char>(nPending << (8 - nHeld));
+    }
+    return {pTarget, nPitch};
+}
+
+StrileEncoder::Rows StrileEncoder::Pad(const Rows& oRows, std::uint32_t nWidth, std::uint32_t nRows,
+                                       std::uint32_t nStoredRows)
+{
+    if (nWidth == moForm.mnStrileWidth && nRows == nStoredRows)
+        return oRows;
+    const std::size_t nPitch = moForm.GetStoredRowBytes(moForm.mnStrileWidth);
+    const std::size_t nRowBytes = moForm.GetStoredRowBytes(nWidth);
+    const bool bWhole = moForm.moSample.IsWhole();
+    const std::size_t nPixelBytes = bWhole ? moForm.GetPlaneChannels() * moForm.moSample.GetBits() / 8 : 1;
+    unsigned char* pTarget = moPadded.Get(nPitch * nStoredRows);
+    for (std::uint32_t nRow = 0; nRow < nStoredRows; ++nRow)
+    {
+        unsigned char* pRow = pTarget + nRow * nPitch;
+        if (nRow >= nRows)
+        {
+            std::memcpy(pRow, pRow - nPitch, nPitch);
+            continue;
+        }
+        std::memcpy(pRow, oRows.mpFirst + nRow * oRows.mnPitch, nRowBytes);
+        if (!bWhole)
+            std::memset(pRow + nRowBytes, 0, nPitch - nRowBytes);
+        for (std::size_t nAt = nRowBytes; bWhole && nAt < nPitch; nAt += nPixelBytes)
+            std::memcpy(pRow + nAt, pRow + nRowBytes - nPixelBytes, nPixelBytes);
+    }
+    return {pTarget, nPitch};
+}
+
+// Differences and the byte order of the file; the rows come out without gaps.
+StrileEncoder::Rows StrileEncoder::Order(const Rows& oRows, std::uint32_t nStoredRows)
+{
+    const SampleForm& oSample = moForm.moSample;
+    const std::size_t nPitch = moForm.GetStoredRowBytes(moForm.mnStrileWidth);
+    const bool bSwapped = moForm.mbBigEndian != BIG_ENDIAN_MACHINE;
+    const bool bLibrary = moForm.mnCompression != COMPRESSION_NONE && !IsOwnCodec(moForm.mnCompression);
+    if (!bLibrary && moForm.mnPredictor != PREDICTOR_NONE)
+    {
+        const codec::BlockShape oShape{moForm.mnStrileWidth, nStoredRows, moForm.GetPlaneChannels(),
+                                       oSample.GetBits() / 8};
+        unsigned char* pTarget = moOrdered.Get(nPitch * nStoredRows);
+        if (moForm.mnPredictor == PREDICTOR_FLOATINGPOINT)
+            codec::ApplyFloatingPoint(oRows.mpFirst, oRows.mnPitch, pTarget, nPitch, oShape, moPredictorScratch);
+        else
+            codec::ApplyHorizontal(oRows.mpFirst, oRows.mnPitch, pTarget, nPitch, oShape,
+                                   bSwapped ? codec::SampleOrder::eSwapped : codec::SampleOrder::eNative);
+        return {pTarget, nPitch};
+    }
+    const std::size_t nPartBytes = oSample.mnPartBits / 8;
+    const bool bTurn = !bLibrary && bSwapped && nPartBytes > 1 && oSample.meWidening == Widening::eNone;
+    if (!bTurn && oRows.mnPitch == nPitch)
+        return oRows;
+    unsigned char* pTarget = moOrdered.Get(nPitch * nStoredRows);
+    if (!bTurn)
+        codec::CopyRows(oRows.mpFirst, oRows.mnPitch, pTarget, nPitch, nPitch, nStoredRows);
+    for (std::uint32_t nRow = 0; bTurn && nRow < nStoredRows; ++nRow)
+        codec::SwapBytes(oRows.mpFirst + nRow * oRows.mnPitch, pTarget + nRow * nPitch, nPitch / nPartBytes,
+                         nPartBytes);
+    return {pTarget, nPitch};
+}
+
+std::span<const unsigned char> StrileEncoder::Compress(const unsigned char* pStored, std::size_t nBytes,
+                                                       std::uint32_t nStoredRows)
+{
+    if (moForm.mnCompression == COMPRESSION_NONE)
+        return {pStored, nBytes};
+    if (mpoLzw)
+    {
+        unsigned char* pCoded = moCoded.Get(codec::LzwEncoder::GetBound(nBytes));
+        return {pCoded, mpoLzw->Encode(pStored, nBytes, pCoded)};
+    }
+    if (mpoDeflate || mpoZstd)
+    {
+        const std::size_t nBound = mpoDeflate ? mpoDeflate->GetBound(nBytes) : mpoZstd->GetBound(nBytes);
+        unsigned char* pCoded = moCoded.Get(nBound);
+        return {pCoded, mpoDeflate ? mpoDeflate->Encode(pStored, nBytes, pCoded, nBound)
+                                   : mpoZstd->Encode(pStored, nBytes, pCoded, nBound)};
+    }
+    moLibraryBytes = EncodeByLibrary(moForm, moLevel, pStored, nBytes, nStoredRows, moPage.GetFileName());
+    return moLibraryBytes;
+}
+
+std::span<const unsigned char> StrileEncoder::Encode(const unsigned char* pSource, std::size_t nPitch,
+                                                     std::uint32_t nWidth, std::uint32_t nRows,
+                                                     std::uint32_t nStoredRows)
+{
+    const Rows oNarrow = Narrow({pSource, nPitch}, nWidth, nRows);
+    const Rows oPadded = Pad(oNarrow, nWidth, nRows, nStoredRows);
+    const Rows oOrdered = Order(oPadded, nStoredRows);
+    return Compress(oOrdered.mpFirst, moForm.GetStoredRowBytes(moForm.mnStrileWidth) * nStoredRows, nStoredRows);
+}
+
+} // namespace krv::plugins::tif

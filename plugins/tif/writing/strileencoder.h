@@ -1,0 +1,71 @@
+#pragma once
+
+#include "plugins/support/codec/deflateencoder.h"
+#include "plugins/support/codec/lzwencoder.h"
+#include "plugins/support/codec/zstdencoder.h"
+#include "plugins/support/scratch.h"
+#include "plugins/tif/page.h"
+#include "plugins/tif/strilesource.h"
+#include "toolkit/exceptions/place.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <span>
+#include <string>
+#include <vector>
+
+namespace krv::plugins::tif
+{
+
+// Turns pixels as they are handed in into the stored bytes of a strip or tile. What a tile has beyond the image repeats
+// the last column and row. The frequent codecs run here, the rare ones in libtiff. One thread at a time.
+class StrileEncoder
+{
+public:
+    // The page outlives it. oLevel: of the codec.
+    StrileEncoder(Page& oPage, PixelUse eUse, std::optional<int> oLevel);
+    ~StrileEncoder();
+
+    // Throws DataException for a page whose pixels cannot be written.
+    void CheckWritable(const Place& oPlace = Place::Current()) const;
+
+    // Whether stored rows are just the rows that are handed in.
+    bool IsPlain() const;
+
+    // nWidth, nRows: what of the strip or tile lies in the image. nStoredRows: the rows that it stores. The result is
+    // valid until the next call; it may be the source itself.
+    std::span<const unsigned char> Encode(const unsigned char* pSource, std::size_t nPitch, std::uint32_t nWidth,
+                                          std::uint32_t nRows, std::uint32_t nStoredRows);
+
+private:
+    struct Rows
+    {
+        const unsigned char* mpFirst;
+        std::size_t mnPitch;
+    };
+
+    std::string FindObstacle() const;
+    Rows Narrow(const Rows& oRows, std::uint32_t nWidth, std::uint32_t nRows);
+    Rows Pad(const Rows& oRows, std::uint32_t nWidth, std::uint32_t nRows, std::uint32_t nStoredRows);
+    Rows Order(const Rows& oRows, std::uint32_t nStoredRows);
+    std::span<const unsigned char> Compress(const unsigned char* pStored, std::size_t nBytes,
+                                            std::uint32_t nStoredRows);
+
+    Page& moPage;
+    const PageForm& moForm;
+    PixelUse meUse;
+    std::optional<int> moLevel;
+    std::unique_ptr<codec::DeflateEncoder> mpoDeflate;
+    std::unique_ptr<codec::ZstdEncoder> mpoZstd;
+    std::unique_ptr<codec::LzwEncoder> mpoLzw;
+    support::Scratch moNarrow;
+    support::Scratch moPadded;
+    support::Scratch moOrdered;
+    support::Scratch moCoded;
+    std::vector<unsigned char> moPredictorScratch;
+    std::vector<unsigned char> moLibraryBytes;
+};
+
+} // namespace krv::plugins::tif

@@ -1,0 +1,115 @@
+#include "datasources/interfaces/datatypechannelfilter.h"
+
+#include "datasources/interfaces/channelinfo.h"
+#include "tests/support/probe.h"
+#include "tests/support/syntheticdataset.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <gtest/gtest.h>
+
+using namespace krv::datasources;
+using krv::gobs::DataType;
+
+namespace
+{
+
+using Channels = std::vector<unsigned int>;
+
+std::shared_ptr<krv::test::ImageModel> ModelOf(std::vector<DataType> oTypes)
+{
+    auto oModel = std::make_shared<krv::test::ImageModel>();
+    oModel->moTypes = std::move(oTypes);
+    return oModel;
+}
+
+} // namespace
+
+TEST(DataTypeChannelFilter, ComparesAllSixFields)
+{
+    const DataType oBase(16, true, false, 3, 4, false);
+    const std::vector<DataType> oTypes = {
+        oBase,
+        {8, true, false, 3, 4, false},
+        {16, false, false, 3, 4, false},
+        {16, true, true, 3, 4, false},
+        {16, true, false, 0, 4, false},
+        {16, true, false, 3, 0, false},
+        {16, true, false, 3, 4, true},
+        oBase,
+    };
+    const krv::test::SyntheticDataset oDataset(ModelOf(oTypes));
+    EXPECT_EQ(DataTypeChannelFilter(oBase).Accept(oDataset), (Channels{1, 8}));
+    for (unsigned int nChannel = 2; nChannel < 8; ++nChannel)
+    {
+        EXPECT_EQ(DataTypeChannelFilter(oTypes[nChannel - 1]).Accept(oDataset), Channels{nChannel});
+        EXPECT_FALSE(DataTypeChannelFilter(oBase).Accept(oDataset, nChannel)) << nChannel;
+    }
+}
+
+TEST(DataTypeChannelFilter, AsksNoChannelOfAnEmptyDatasetAndLeaksNoDescription)
+{
+    krv::test::Probe oProbe;
+    const DataTypeChannelFilter oFilter(krv::gobs::eDT_16U);
+    const auto oEmpty = Decorate(oProbe, std::make_unique<krv::test::SyntheticDataset>(ModelOf({})));
+    EXPECT_TRUE(oFilter.Accept(dynamic_cast<IRasterDataset&>(*oEmpty)).empty());
+    EXPECT_EQ(oProbe.GetCalls(), std::vector<std::string>{"Raster::GetChanCount"});
+
+    const auto oFull = Decorate(oProbe, std::make_unique<krv::test::SyntheticDataset>(
+                                            ModelOf({krv::gobs::eDT_8U, krv::gobs::eDT_16S, krv::gobs::eDT_16U})));
+    auto& oRaster = dynamic_cast<IRasterDataset&>(*oFull);
+    for (unsigned int n = 1, nThrown = 1; nThrown != 0; ++n)
+    {
+        oProbe.Arm(n, krv::test::Fault::eForeign);
+        nThrown = 0;
+        try
+        {
+            EXPECT_EQ(oFilter.Accept(oRaster), Channels{3});
+        }
+        catch (int)
+        {
+            nThrown = 1;
+        }
+        EXPECT_EQ(oProbe.GetLive(), 2) << n; // the two datasets
+    }
+}
+
+TEST(DataTypeChannelFilter, ADerivedRuleDecidesAndFailuresPass)
+{
+    class EvenFilter : public DataTypeChannelFilter
+    {
+    public:
+        using DataTypeChannelFilter::Accept;
+        using DataTypeChannelFilter::DataTypeChannelFilter;
+        bool Accept(const IRasterDataset&, unsigned int nChannel) const override { return nChannel % 2 == 0; }
+    };
+    const DataType oType = krv::gobs::eDT_8U;
+    const krv::test::SyntheticDataset oDataset(ModelOf({oType, oType, oType, oType}));
+    EXPECT_EQ(EvenFilter(oType).Accept(oDataset), (Channels{2, 4}));
+    EXPECT_THROW(DataTypeChannelFilter(oType).Accept(oDataset, 5), krv::DataException);
+
+    DataTypeChannelFilter oCopy(krv::gobs::eDT_64R);
+    oCopy = DataTypeChannelFilter(oType);
+    EXPECT_TRUE(DataTypeChannelFilter(oCopy).Accept(oDataset, 1));
+}
+
+TEST(AccessCapabilities, ThreeIndependentFlags)
+{
+    for (unsigned int nBits = 0; nBits < 8; ++nBits)
+    {
+        AccessCapabilities oTarget;
+        oTarget.Copy(AccessCapabilities((nBits & 1) != 0, (nBits & 2) != 0, (nBits & 4) != 0));
+        EXPECT_EQ(oTarget.IsReadable() + 2u * oTarget.IsWritable() + 4u * oTarget.IsUpdatable(), nBits);
+    }
+}
+
+TEST(FileFormat, CopiesBothMembersAndFlagsKeepTheirValues)
+{
+    krv::test::SimpleFormat oFirst("FIRST");
+    const krv::test::SimpleFormat oSecond("SECOND");
+    oFirst.Assignment(oSecond);
+    EXPECT_EQ(oFirst.GetShortName(), "SECOND");
+    EXPECT_EQ(krv::test::SimpleFormat(oFirst).GetExtensions(), std::vector<std::string>{"test"});
+    EXPECT_EQ(eReadOnly, 0);
+    EXPECT_EQ(eUpdate, 1);
+    EXPECT_EQ(eDone, 0);
+}

@@ -1,0 +1,100 @@
+#include "datasources/iomanager/formatcapabilities.h"
+
+#include "datasources/iomanager/xalanselect.h"
+#include "tests/support/outputcapture.h"
+#include "tests/support/tempfolder.h"
+#include "toolkit/xml/xmldocument.h"
+#include "toolkit/xml/xmlutil.h"
+
+#include <gtest/gtest.h>
+
+using namespace krv::datasources;
+
+namespace
+{
+
+constexpr unsigned long long NO_LIMIT = 18446744073709551615ull;
+
+constexpr char DESCRIPTION[] = R"(<?xml version="1.0"?>
+<Format>
+  <Object>
+     name of it
+  </Object>
+  <Capabilities>
+    <Dataset><SupportsCreate>no</SupportsCreate><SupportsGeoreferecing/></Dataset>
+    <Limits><A> 42
+      </A><B>18446744073709551614</B><C>18446744073709551616</C><D>-1</D><E>many</E><F/><G>7 8</G></Limits>
+  </Capabilities>
+</Format>)";
+
+} // namespace
+
+TEST(FormatCapabilities, PresenceAloneCounts)
+{
+    const krv::test::TempFolder oFolder;
+    const FormatCapabilities oCapabilities(oFolder.Write("format.xml", DESCRIPTION));
+    EXPECT_TRUE(oCapabilities.IsSupported(CAPABILITY_CREATE)); // although it says no
+    EXPECT_TRUE(oCapabilities.IsSupported(CAPABILITY_GEOREFERENCING));
+    EXPECT_TRUE(oCapabilities.IsSupported("/Format/Capabilities/Dataset/SupportsGeoreferecing")); // as it is spelt
+    EXPECT_FALSE(oCapabilities.IsSupported(CAPABILITY_METADATA));
+    EXPECT_FALSE(oCapabilities.IsSupported(CAPABILITY_BITMAP_CREATE));
+
+    // The file is read for every question.
+    oFolder.Write("format.xml", "<Format><Capabilities><Bitmap><CanCreate/></Bitmap></Capabilities></Format>");
+    EXPECT_FALSE(oCapabilities.IsSupported(CAPABILITY_CREATE));
+    EXPECT_TRUE(oCapabilities.IsSupported(CAPABILITY_BITMAP_CREATE));
+}
+
+TEST(FormatCapabilities, Limits)
+{
+    const krv::test::TempFolder oFolder;
+    const FormatCapabilities oCapabilities(oFolder.Write("format.xml", DESCRIPTION));
+    const std::pair<const char*, unsigned long long> LIMITS[] = {{"A", 42},       {"B", 18446744073709551614ull},
+                                                                 {"C", NO_LIMIT}, {"D", NO_LIMIT},
+                                                                 {"E", NO_LIMIT}, {"F", NO_LIMIT},
+                                                                 {"G", NO_LIMIT}, {"Absent", NO_LIMIT}};
+    for (const auto& [pName, nLimit] : LIMITS)
+        EXPECT_EQ(oCapabilities.GetLimit(std::string("/Format/Capabilities/Limits/") + pName), nLimit) << pName;
+}
+
+TEST(FormatCapabilities, FailuresAreDebugOutputAndNo)
+{
+    const krv::test::TempFolder oFolder;
+    const std::string good = oFolder.Write("format.xml", DESCRIPTION);
+    const std::string broken = oFolder.Write("broken.xml", "<Format><Capabilities>");
+    const std::pair<std::string, std::string> FAILING[] = {
+        {oFolder.File("missing.xml"), CAPABILITY_CREATE}, {broken, CAPABILITY_CREATE}, {good, "///["}};
+    for (const int nLevel : {0, 1})
+    {
+        for (const auto& [path, xpath] : FAILING)
+        {
+            krv::test::OutputCapture oOutput(nLevel);
+            EXPECT_FALSE(FormatCapabilities(path).IsSupported(xpath));
+            EXPECT_EQ(FormatCapabilities(path).GetLimit(xpath), NO_LIMIT);
+            ASSERT_EQ(oOutput.moDebug.size(), nLevel == 0 ? 0u : 2u) << path << xpath;
+            for (const auto& oLine : oOutput.moDebug)
+            {
+                EXPECT_EQ(oLine.mnLevel, 1);
+                EXPECT_EQ(oLine.moModule, "qrframework");
+                EXPECT_EQ(oLine.moSourceFile, "datasources/iomanager/formatcapabilities");
+                EXPECT_NE(oLine.mnLine, 0u);
+                EXPECT_FALSE(oLine.moMessage.empty());
+                // The XML parser's exception is of neither kind that carries its message.
+                EXPECT_EQ(oLine.moMessage == "An unknown error occur during the XPath evaluation", path != good);
+            }
+        }
+    }
+}
+
+TEST(XalanSelect, ValuesAreTrimmedAndNodesInOrder)
+{
+    const krv::xml::XmlSession oSession;
+    const std::string text = "<a>\n <b>\t first\r\n </b><c>x</c><b/><b>second &#228;</b></a>";
+    const krv::xml::Document oDocument = krv::xml::ParseMemory(text.data(), text.size(), "text");
+    EXPECT_EQ(SelectNodeValue("/a/b", oDocument.Get()), "first");
+    EXPECT_EQ(SelectNodeValue("/a/b[2]", oDocument.Get()), "");
+    EXPECT_EQ(SelectNodeValue("/a/b[3]", oDocument.Get()), "second \xc3\xa4");
+    EXPECT_EQ(SelectNodeValue("/a/none", oDocument.Get()), "");
+    EXPECT_EQ(SelectMultipleNode("/a/b", oDocument.Get()).size(), 3u);
+    EXPECT_TRUE(SelectMultipleNode("/none", oDocument.Get()).empty());
+}

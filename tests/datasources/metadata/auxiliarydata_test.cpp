@@ -1,0 +1,305 @@
+#include "datasources/metadata/auxiliarydata.h"
+
+#include "datasources/metadata/metadatafilters.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <gtest/gtest.h>
+
+#include <functional>
+#include <memory>
+#include <vector>
+
+namespace krv::datasources
+{
+
+namespace
+{
+
+std::vector<std::string> Keys(const MetadataMap& oMap)
+{
+    std::vector<std::string> oKeys;
+    for (const auto& oEntry : oMap)
+        oKeys.push_back(oEntry.first);
+    return oKeys;
+}
+
+// Every operation that takes a channel number, with the name that must stand in the exception's signature.
+struct ChannelOperation
+{
+    const char* mpName;
+    std::function<void(AuxiliaryData&, unsigned int)> moCall;
+};
+
+std::vector<ChannelOperation> ChannelOperations()
+{
+    static const MetadataMap MAP = {{"k", "v"}};
+    return {{"GetChanMetadata",
+             [](AuxiliaryData& o, unsigned int n)
+             {
+                 o.GetChanMetadata(n);
+             }},
+            {"GetChanMetadataValue",
+             [](AuxiliaryData& o, unsigned int n)
+             {
+                 o.GetChanMetadataValue("k", n);
+             }},
+            {"GetChannelDescription",
+             [](AuxiliaryData& o, unsigned int n)
+             {
+                 o.GetChannelDescription(n);
+             }},
+            {"GetChanOverviewMetadata",
+             [](AuxiliaryData& o, unsigned int n)
+             {
+                 o.GetChanOverviewMetadata(n);
+             }},
+            {"SetChanMetadata",
+             [](AuxiliaryData& o, unsigned int n)
+             {
+                 o.SetChanMetadata(MAP, n);
+             }},
+            {"SetChanMetadataValue",
+             [](AuxiliaryData& o, unsigned int n)
+             {
+                 o.SetChanMetadataValue("k", "v", n);
+             }},
+            {"RemoveChanMetadataValue",
+             [](AuxiliaryData& o, unsigned int n)
+             {
+                 o.RemoveChanMetadataValue("k", n);
+             }},
+            {"AppendChanMetadata",
+             [](AuxiliaryData& o, unsigned int n)
+             {
+                 o.AppendChanMetadata(MAP, n, true);
+             }},
+            {"SetChannelDescription", [](AuxiliaryData& o, unsigned int n)
+             {
+                 o.SetChannelDescription("d", n);
+             }}};
+}
+
+void ExpectOutOfBounds(const ChannelOperation& oOperation, AuxiliaryData& oData, unsigned int nChannel)
+{
+    SCOPED_TRACE(std::string(oOperation.mpName) + " of channel " + std::to_string(nChannel));
+    try
+    {
+        oOperation.moCall(oData, nChannel);
+        FAIL() << "nothing thrown";
+    }
+    catch (const krv::OutOfBoundsException& oError)
+    {
+        EXPECT_EQ(oError.GetMessage(), "Out of bounds.");
+        EXPECT_EQ(oError.GetIndices(), std::vector<unsigned int>{nChannel});
+        EXPECT_EQ(oError.GetSourceFile(), "datasources/metadata/auxiliarydata");
+        EXPECT_EQ(oError.GetLine(), 354u);
+        const std::string sSignature = std::string("AuxiliaryData::") + oOperation.mpName + "(";
+        EXPECT_NE(oError.GetFunction().find(sSignature), std::string::npos) << oError.GetFunction();
+    }
+    EXPECT_FALSE(oData.IsModified());
+}
+
+} // namespace
+
+TEST(CaseInsensitiveCompare, OrdersByFoldedBytesUpToTheFirstNul)
+{
+    const detail::CaseInsensitiveCompare oLess;
+    struct Case
+    {
+        std::string moFirst, moSecond;
+        bool mbLess, mbGreater;
+    };
+    const Case CASES[] = {{"Key", "kEY", false, false},
+                          {"_DBLayout", "Band", true, false},
+                          {"a", "ab", true, false},
+                          {"", "a", true, false},
+                          {"Z", "[", false, true}, // compared as z
+                          {"\xC4", "\xE4", true, false},
+                          {"z", "\x80", true, false}, // unsigned bytes
+                          {std::string("a\0b", 3), "A", false, false},
+                          {std::string("a\0b", 3), "aa", true, false}};
+    for (const Case& oCase : CASES)
+    {
+        EXPECT_EQ(oLess(oCase.moFirst, oCase.moSecond), oCase.mbLess) << oCase.moFirst << " < " << oCase.moSecond;
+        EXPECT_EQ(oLess(oCase.moSecond, oCase.moFirst), oCase.mbGreater) << oCase.moSecond << " < " << oCase.moFirst;
+    }
+}
+
+TEST(AuxiliaryData, ChannelOutsideTheCountThrowsAndLeavesTheObject)
+{
+    AuxiliaryData oNone;
+    AuxiliaryData oTwo(2);
+    EXPECT_EQ(oNone.GetChannelCount(), 0u);
+    for (const ChannelOperation& oOperation : ChannelOperations())
+    {
+        ExpectOutOfBounds(oOperation, oNone, 1);
+        ExpectOutOfBounds(oOperation, oTwo, 0);
+        ExpectOutOfBounds(oOperation, oTwo, 3);
+        ExpectOutOfBounds(oOperation, oTwo, 4294967295u);
+    }
+    EXPECT_TRUE(oTwo.GetChanMetadata(1).empty() && oTwo.GetChanMetadata(2).empty());
+}
+
+TEST(AuxiliaryData, SingleValueSettersKeepTheFirstSpellingAndAssignTheFlag)
+{
+    AuxiliaryData oData(1);
+    oData.SetFileMetadataValue("Key", "a");
+    EXPECT_EQ(oData.GetFileMetadataValue("KEY"), "a");
+    oData.SetFileMetadataValue("KEY", "b");
+    EXPECT_EQ(Keys(oData.GetFileMetadata()), std::vector<std::string>{"Key"});
+    EXPECT_EQ(oData.GetFileMetadataValue("key"), "b");
+    EXPECT_EQ(oData.GetFileMetadataValue("absent"), "");
+
+    oData.SetFileMetadata({{"Key", "a"}});
+    EXPECT_TRUE(oData.IsModified());
+    oData.SetFileMetadataValue("key", "a");
+    EXPECT_FALSE(oData.IsModified());
+    oData.SetFileMetadataValue("key", "A");
+    EXPECT_TRUE(oData.IsModified());
+    oData.SetChanMetadataValue("chan", "1", 1);
+    EXPECT_TRUE(oData.IsModified());
+    oData.SetChanMetadataValue("CHAN", "1", 1);
+    EXPECT_FALSE(oData.IsModified());
+    oData.SetChanMetadata(oData.GetChanMetadata(1), 1);
+    EXPECT_TRUE(oData.IsModified());
+    EXPECT_EQ(oData.GetChanMetadataValue("chan", 1), "1");
+}
+
+TEST(AuxiliaryData, RemovalEmptiesTheValueAndLeavesTheFlag)
+{
+    AuxiliaryData oData(1);
+    oData.SetFileMetadataValue("A", "1");
+    oData.SetChanMetadataValue("A", "1", 1);
+    oData.RemoveFileMetadataValue("a");
+    oData.RemoveFileMetadataValue("absent");
+    EXPECT_EQ(oData.GetFileMetadata(), (MetadataMap{{"A", ""}}));
+    EXPECT_TRUE(oData.IsModified());
+    oData.SetFileMetadataValue("A", "");
+    oData.RemoveChanMetadataValue("a", 1);
+    EXPECT_EQ(oData.GetChanMetadata(1), (MetadataMap{{"A", ""}}));
+    EXPECT_FALSE(oData.IsModified());
+}
+
+TEST(AuxiliaryData, AppendMergesOrStopsAtTheFirstDuplicate)
+{
+    const MetadataMap ADDED = {{"a", "1"}, {"b", "2"}, {"c", "3"}};
+    AuxiliaryData oData(1);
+    oData.SetChannelDescription("description", 1);
+    oData.SetFileMetadataValue("x", "");
+    oData.SetFileMetadataValue("x", "");
+    oData.AppendChanMetadata({{"B", "x"}, {"d", "4"}}, 1, false);
+    EXPECT_FALSE(oData.IsModified());
+    try
+    {
+        oData.AppendChanMetadata(ADDED, 1, false);
+        FAIL() << "nothing thrown";
+    }
+    catch (const krv::Exception& oError)
+    {
+        EXPECT_EQ(oError.GetMessage(), "Duplicate key \"b\" found while appending metadata tags");
+        EXPECT_EQ(oError.GetFunction(), "");
+        EXPECT_EQ(oError.GetSourceFile(), "");
+        EXPECT_EQ(oError.GetLine(), 0u);
+    }
+    EXPECT_EQ(oData.GetChanMetadata(1), (MetadataMap{{"a", "1"}, {"B", "x"}, {"d", "4"}}));
+
+    oData.AppendChanMetadata(ADDED, 1, true);
+    EXPECT_EQ(oData.GetChanMetadata(1), (MetadataMap{{"a", "1"}, {"b", "2"}, {"c", "3"}, {"d", "4"}}));
+    EXPECT_EQ(Keys(oData.GetChanMetadata(1)), (std::vector<std::string>{"a", "b", "c", "d"}));
+    EXPECT_EQ(oData.GetChannelDescription(1), "description");
+}
+
+TEST(AuxiliaryData, AppendAcceptsTheChannelsOwnMap)
+{
+    AuxiliaryData oData(1);
+    oData.AppendChanMetadata(oData.GetChanMetadata(1), 1, false);
+    oData.SetChanMetadata({{"a", "1"}, {"b", "2"}}, 1);
+    const MetadataMap oBefore = oData.GetChanMetadata(1);
+    oData.AppendChanMetadata(oData.GetChanMetadata(1), 1, true);
+    EXPECT_EQ(oData.GetChanMetadata(1), oBefore);
+    EXPECT_THROW(oData.AppendChanMetadata(oData.GetChanMetadata(1), 1, false), krv::Exception);
+    EXPECT_EQ(oData.GetChanMetadata(1), oBefore);
+}
+
+TEST(AuxiliaryData, CopiesAreIndependentAndFilteringWithoutFiltersIsACopy)
+{
+    AuxiliaryData oSource(2);
+    oSource.SetFileMetadataValue("file", "1");
+    oSource.SetChanMetadataValue("chan", "2", 2);
+    oSource.SetChannelDescription("second", 2);
+    AuxiliaryData oCopy = oSource.GetFilteredMeta(nullptr, nullptr);
+    EXPECT_TRUE(oCopy.IsModified());
+    EXPECT_EQ(oCopy.GetFileMetadata(), oSource.GetFileMetadata());
+    EXPECT_EQ(oCopy.GetChanMetadata(2), oSource.GetChanMetadata(2));
+    EXPECT_EQ(oCopy.GetChannelDescription(2), "second");
+
+    oCopy.SetFileMetadataValue("file", "changed");
+    oCopy.SetChannelDescription("changed", 2);
+    EXPECT_EQ(oSource.GetFileMetadataValue("file"), "1");
+    EXPECT_EQ(oSource.GetChannelDescription(2), "second");
+
+    const AuxiliaryData& oSelf = oSource;
+    oSource = oSelf;
+    EXPECT_EQ(oSource.GetChanMetadataValue("chan", 2), "2");
+    oSource = AuxiliaryData(5);
+    EXPECT_EQ(oSource.GetChannelCount(), 5u);
+}
+
+TEST(AuxiliaryData, FilterTakesOutWhatItSelects)
+{
+    AuxiliaryData oData(2);
+    oData.SetFileMetadata({{"keep", "1"}, {"drop_file", "2"}});
+    oData.SetChanMetadata({{"keep", "1"}, {"drop_chan", "2"}}, 1);
+    oData.SetChanMetadata({{"drop_chan", "2"}, {"drop_file", "3"}}, 2);
+    const std::unique_ptr<krv::qrfutils::IMetadataFilter> oFile(krv::qrfutils::GetMetadataFilter("drop_file", false));
+    const std::unique_ptr<krv::qrfutils::IMetadataFilter> oChan(krv::qrfutils::GetMetadataFilter("*_chan", false));
+    const AuxiliaryData oFiltered = oData.GetFilteredMeta(oFile.get(), oChan.get());
+    EXPECT_EQ(oFiltered.GetFileMetadata(), (MetadataMap{{"keep", "1"}}));
+    EXPECT_EQ(oFiltered.GetChanMetadata(1), (MetadataMap{{"keep", "1"}}));
+    EXPECT_EQ(oFiltered.GetChanMetadata(2), (MetadataMap{{"drop_file", "3"}}));
+    EXPECT_EQ(oData.GetChanMetadata(2).size(), 2u);
+}
+
+TEST(AuxiliaryData, CleaningRemovesTheBookkeepingTagsAlone)
+{
+    const MetadataMap KEPT_FILE = {{"_DBLayout2", ""}, {"LAYER_CRC", ""}, {"_Overview_2", ""}, {"Sensor", ""}};
+    MetadataMap oFile = KEPT_FILE;
+    oFile["_DBLayout"] = "x";
+    const MetadataMap KEPT_CHAN = {{"_Overview_", ""}, {"_Overview_3a", ""}, {"layer_crc", ""}, {"_DBLayout", ""}};
+    MetadataMap oChan = KEPT_CHAN;
+    oChan["_Overview_3"] = "x";
+    oChan["_Overview_16"] = "y";
+
+    AuxiliaryData oData(3);
+    oData.SetFileMetadata(oFile);
+    oData.SetChanMetadata(oChan, 1);
+    oData.SetChanMetadata({{"LAYER_CRC", "x"}, {"_overview_2", ""}}, 3);
+    const AuxiliaryData oCleaned = oData.GetCleanedMeta();
+    EXPECT_EQ(oCleaned.GetFileMetadata(), KEPT_FILE);
+    EXPECT_EQ(oCleaned.GetChanMetadata(1), KEPT_CHAN);
+    EXPECT_EQ(oCleaned.GetChanMetadata(3), (MetadataMap{{"_overview_2", ""}}));
+    EXPECT_EQ(oData.GetChanOverviewMetadata(1), (MetadataMap{{"_Overview_3", "x"}, {"_Overview_16", "y"}}));
+    EXPECT_TRUE(oData.GetChanOverviewMetadata(3).empty());
+
+    oData.SetFileMetadata({{"_dblayout", "x"}});
+    EXPECT_EQ(oData.GetCleanedMeta().GetFileMetadata().size(), 1u);
+}
+
+TEST(AuxiliaryData, HostileTagsAreHeldByteForByte)
+{
+    const std::string LONG(1 << 20, '_');
+    const std::string NUL("a\0b", 3);
+    AuxiliaryData oData(1);
+    oData.SetChanMetadataValue(LONG, LONG, 1);
+    oData.SetChanMetadataValue(NUL, NUL, 1);
+    oData.SetChanMetadataValue("\xFF\xC0\x80", "\xFE\n", 1);
+    for (int n = 0; n < 5000; ++n)
+        oData.SetChanMetadataValue("_Overview_" + std::to_string(n), "", 1);
+    const AuxiliaryData oCleaned = oData.GetCleanedMeta();
+    EXPECT_EQ(oCleaned.GetChanMetadata(1).size(), 3u);
+    EXPECT_EQ(oCleaned.GetChanMetadataValue(LONG, 1), LONG);
+    EXPECT_EQ(oCleaned.GetChanMetadataValue("A", 1), NUL); // keys end at their first NUL
+    EXPECT_EQ(oCleaned.GetChanMetadataValue("\xFF\xC0\x80", 1), "\xFE\n");
+}
+
+} // namespace krv::datasources

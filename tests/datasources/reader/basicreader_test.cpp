@@ -1,0 +1,539 @@
+#include "datasources/reader/basicreader.h"
+
+#include "datasources/interfaces/datatypechannelfilter.h"
+#include "datasources/reader/checkrastercompatible.h"
+#include "datasources/reader/rasterrange.h"
+#include "tests/datasources/reader/readertest.h"
+#include "toolkit/ogc/cs/geocodinginfo.h"
+
+#include <limits>
+#include <random>
+
+using namespace krv::datasources;
+using namespace krv::test;
+
+namespace
+{
+
+class BasicReaderTest : public ReaderTest
+{
+protected:
+    using ReaderPtr = std::unique_ptr<BasicReader>;
+
+    struct Constructor
+    {
+        const char* mpName;
+        std::function<ReaderPtr()> moMake;
+        bool mbWraps = false; // rethrows everything that has a message as DataException
+    };
+
+    // Every public constructor over three channels, or two bitmaps; mpoOpen is the dataset of those that take one.
+    std::vector<Constructor> Constructors()
+    {
+        const auto Facet = [this]<class Interface>(Interface*)
+        {
+            return dynamic_cast<Interface*>(mpoOpen.get());
+        };
+        return {
+            {"file", [this] { return std::make_unique<BasicReader>(moFile); }, true},
+            {"file and channels",
+             [this]
+             {
+                 return std::make_unique<BasicReader>(moFile, Channels{3, 1, 2});
+             }},
+            {"file and no channels",
+             [this]
+             {
+                 return std::make_unique<BasicReader>(moFile, Channels{});
+             }},
+            {"file and filter",
+             [this]
+             {
+                 return std::make_unique<BasicReader>(moFile, moFilter);
+             }},
+            {"bitmaps",
+             [=]
+             {
+                 return std::make_unique<BasicReader>(Facet((IBitmapDataset*)nullptr), Channels{7, 2}, false);
+             }},
+            {"dataset",
+             [this]
+             {
+                 return std::make_unique<BasicReader>(mpoOpen.get(), Channels{2, 2, 3}, false);
+             }},
+            {"own dataset",
+             [this]
+             {
+                 auto oReader = std::make_unique<BasicReader>(mpoOpen.get(), Channels{}, true);
+                 [[maybe_unused]] IDataset* const poTakenOver = mpoOpen.release();
+                 return oReader;
+             }},
+            {"level",
+             [=]
+             {
+                 auto* const poRaster = Facet((IRasterDataset*)nullptr);
+                 const std::unique_ptr<IOverviewManager> oManager(poRaster->GetOverviewManager());
+                 return std::make_unique<BasicReader>(poRaster, oManager->GetOverviewIO(2, {1, 2}), Channels{1, 2});
+             }},
+        };
+    }
+
+    // Every reading operation; results go at once.
+    static void UseEverything(BasicReader& oReader)
+    {
+        oReader.SetOptimalTileSize();
+        for (const RasterPtr& oTile : RasterRange(oReader))
+            ASSERT_NE(oTile, nullptr);
+        oReader.SetMargins(2, 1, eMirror);
+        RasterPtr(*oReader.FindRaster(9, 8));
+        RasterPtr(oReader.ReadRaster(3, 2, 2, 3));
+        krv::gobs::Raster oOwn({4, 4, oReader.GetChansCount(), oReader.GetDataType()}, {0, 0, 3, 3});
+        oReader.ReadRaster(&oOwn);
+        oReader.GetAuxiliaryData();
+        oReader.GetFileFormat();
+        EXPECT_EQ(oReader.GetCRS(), nullptr);
+        std::unique_ptr<krv::ogc::cs::GeocodingInfo>(oReader.GetGeocodingInfo());
+        const std::unique_ptr<IOverviewReaderAccessor> oAccessor(oReader.GetOverviewReaderAccessor());
+        if (oAccessor == nullptr)
+            return;
+        for (const unsigned int nLevel : oAccessor->GetLevels())
+        {
+            oAccessor->IsValid(1, nLevel);
+            oAccessor->IsLevelValid(nLevel);
+            oAccessor->GetAuxiliaryData(nLevel);
+            const std::unique_ptr<IRasterReader> oLevel(oAccessor->CreateRasterReader(nLevel));
+            RasterPtr(oLevel->GetRaster(0));
+        }
+    }
+
+    BasicReaderTest()
+    {
+        moModel->moLevels = {2, 4};
+        moModel->moBitmaps = {{2, "clouds"}, {7, "water"}};
+    }
+
+    DataTypeChannelFilter moFilter{krv::gobs::eDT_16U};
+    std::unique_ptr<IDataset> mpoOpen;
+};
+
+} // namespace
+
+// A probe throws at the first, second, third ... call of every constructor and of everything that reads, until a run
+// gets through: nothing stays alive, the exception is the documented one, and no I/O object outlives its dataset.
+TEST_F(BasicReaderTest, NothingLeaksWhicheverCallFails)
+{
+    for (const Constructor& oConstructor : Constructors())
+    {
+        for (const Fault eFault : {Fault::eKrv, Fault::eStandard, Fault::eForeign})
+        {
+            unsigned int nCall = 0;
+            do
+            {
+                mpoOpen = MakeDataset();
+                moProbe.Arm(++nCall, eFault);
+                bool bConstructed = false;
+                const std::string error = Error(
+                    [&]
+                    {
+                        const ReaderPtr oReader = oConstructor.moMake();
+                        bConstructed = true;
+                        UseEverything(*oReader);
+                    });
+                const bool bWraps = oConstructor.mbWraps && !bConstructed && eFault != Fault::eForeign;
+                const char* const ERRORS[] = {"io: probe", "standard: probe", "foreign"};
+                EXPECT_EQ(error, !moProbe.HasThrown() ? "" : bWraps ? "data: probe" : ERRORS[static_cast<int>(eFault)]);
+                mpoOpen.reset();
+                ASSERT_EQ(moProbe.GetLive(), 0)
+                    << oConstructor.mpName << ", call " << nCall << " " << moProbe.GetCalls().back();
+                ASSERT_FALSE(moProbe.HasOrphans()) << oConstructor.mpName << ", call " << nCall;
+            } while (moProbe.HasThrown());
+            EXPECT_GT(nCall, 20u) << oConstructor.mpName;
+        }
+    }
+}
+
+TEST_F(BasicReaderTest, ConstructorsCheckTheirArguments)
+{
+    const auto WithoutRaster = [this]
+    {
+        moMakeDataset = [this]
+        {
+            return std::make_unique<DatasetWithoutRaster>(moModel);
+        };
+    };
+    const auto WithoutChannels = [this]
+    {
+        moMakeDataset = [this]
+        {
+            return Decorate(moProbe, std::make_unique<SyntheticDataset>(moModel));
+        };
+        moModel->moTypes.clear();
+    };
+    const Channels oAll;
+    WithoutRaster();
+    EXPECT_EQ(Error([&] { BasicReader(moFile, oAll); }), "data: Format does not support rasters: file=" + moFile);
+    EXPECT_EQ(Error([&] { BasicReader(moFile, moFilter); }), "data: Format does not support rasters: file=" + moFile);
+    EXPECT_EQ(Error([&] { BasicReader{moFile}; }), "data: Format does not support rasters: file=" + moFile);
+    const auto oBare = MakeDataset();
+    EXPECT_EQ(Error([&] { BasicReader(oBare.get(), oAll, false); }), "data: This dataset doesn't support Raster.");
+    EXPECT_EQ(Error([&] { BasicReader((IDataset*)nullptr, oAll, false); }), "data: The dataset is NULL");
+    EXPECT_EQ(Error([&] { BasicReader((IBitmapDataset*)nullptr, oAll, true); }), "data: The dataset is NULL");
+    Synthetic<BitmapPart> oBitmaps(moModel);
+    EXPECT_EQ(Error([&] { BasicReader((IBitmapDataset*)&oBitmaps, oAll, false); }), "data: The dataset is NULL");
+
+    Synthetic<RasterPart> oRaster(moModel);
+    const auto NewIO = [&]
+    {
+        return oRaster.GetRasterIO({1});
+    };
+    EXPECT_EQ(Error([&] { BasicReader(nullptr, NewIO(), {1}); }), "data: Invalid Raster Dataset: poRDS cannot be NULL");
+    EXPECT_EQ(Error([&] { BasicReader(&oRaster, nullptr, {1}); }),
+              "data: Invalid Raster IO: poRasterIO cannot be NULL");
+    EXPECT_EQ(Error([&] { BasicReader(&oRaster, NewIO(), {1}); }), "data: Invalid Raster Dataset");
+
+    IRasterIO* const poIO = NewIO();
+    WithoutChannels();
+    const auto oEmpty = MakeDataset();
+    EXPECT_EQ(Error([&] { BasicReader(moFile, oAll); }), "data: No available channels.");
+    EXPECT_EQ(Error([&] { BasicReader(moFile, moFilter); }), "data: No channels in dataset: file=" + moFile);
+    EXPECT_EQ(Error([&] { BasicReader{moFile}; }), "data: No channels in dataset: file=" + moFile);
+    EXPECT_EQ(Error([&] { BasicReader(oEmpty.get(), oAll, false); }), "data: No available channels.");
+    EXPECT_EQ(Error([&] { BasicReader(dynamic_cast<IRasterDataset*>(oEmpty.get()), poIO, oAll); }),
+              "data: No available channels.");
+    moModel->moBitmaps.clear();
+    EXPECT_EQ(Error([&] { BasicReader(dynamic_cast<IBitmapDataset*>(oEmpty.get()), oAll, false); }),
+              "data: Bitmap list is empty");
+    EXPECT_EQ(moProbe.GetLive(), 1); // oEmpty: ownership was never taken
+    EXPECT_THROW(BasicReader(moHome.GetFolder().File("missing")), krv::FileNotFoundException);
+}
+
+TEST_F(BasicReaderTest, ExceptionsOfConstructorsNameTheirPlace)
+{
+    moModel->moTypes.clear();
+    for (const auto& oMake : std::vector<std::function<void()>>{[this] { BasicReader{moFile}; },
+                                                                [this] { BasicReader(moFile, Channels{}); },
+                                                                [this] { BasicReader(moFile, moFilter); },
+                                                                [this]
+                                                                {
+                                                                    BasicReader(MakeDataset().get(), {}, false);
+                                                                }})
+    {
+        try
+        {
+            oMake();
+            FAIL();
+        }
+        catch (const krv::DataException& oException)
+        {
+            EXPECT_EQ(oException.GetSourceFile(), "datasources/reader/basicreader");
+            EXPECT_NE(oException.GetFunction().find("BasicReader::BasicReader("), std::string::npos)
+                << oException.GetFunction();
+            EXPECT_GT(oException.GetLine(), 0u);
+        }
+    }
+}
+
+TEST_F(BasicReaderTest, AnswersFromEveryConstructor)
+{
+    mpoOpen = MakeDataset();
+    const std::vector<Channels> oExpected = {{1, 2, 3}, {3, 1, 2}, {1, 2, 3}, {1, 2, 3},
+                                             {7, 2},    {2, 2, 3}, {1, 2, 3}, {1, 2}};
+    std::size_t nIndex = 0;
+    for (const Constructor& oConstructor : Constructors())
+    {
+        SCOPED_TRACE(oConstructor.mpName);
+        if (mpoOpen == nullptr)
+            mpoOpen = MakeDataset();
+        const Channels& oChannels = oExpected[nIndex++];
+        const ReaderPtr oReader = oConstructor.moMake();
+        const bool bLevel = oConstructor.mpName == std::string("level");
+        const bool bBitmaps = oConstructor.mpName == std::string("bitmaps");
+        EXPECT_EQ(oReader->GetWidth(), bLevel ? 11u : 21u);
+        EXPECT_EQ(oReader->GetHeight(), bLevel ? 9u : 17u);
+        EXPECT_EQ(oReader->GetChansCount(), oChannels.size());
+        EXPECT_EQ(oReader->GetDataType(), krv::gobs::DataType(bBitmaps ? krv::gobs::eDT_8U : krv::gobs::eDT_16U));
+        ASSERT_EQ(oReader->GetChannelsInfo().size(), oChannels.size());
+        EXPECT_EQ(oReader->GetChannelsInfo().back()->GetDataType(), oReader->GetDataType());
+        EXPECT_EQ(oReader->GetTileWidth(), 8u);
+        EXPECT_EQ(oReader->GetTileHeight(), 6u);
+        EXPECT_EQ(oReader->GetTileCount(), bLevel ? 4u : 9u);
+        EXPECT_EQ(oReader->GetXMargin() + oReader->GetYMargin(), 0u);
+        EXPECT_EQ(oReader->GetMarginBehaviour(), eMirror);
+        EXPECT_EQ(oReader->GetFileFormat(), moModel->mpoFormat);
+        const bool bHasAccessor =
+            std::unique_ptr<IOverviewReaderAccessor>(oReader->GetOverviewReaderAccessor()) != nullptr;
+        EXPECT_EQ(bHasAccessor, !bLevel && !bBitmaps);
+
+        const RasterPtr oWhole(oReader->ReadRaster(0, 0, oReader->GetWidth(), oReader->GetHeight()));
+        EXPECT_EQ(Bytes(*oWhole), bLevel     ? LevelImage(*moModel, 2, oChannels)
+                                  : bBitmaps ? BitmapImage(*moModel, oChannels)
+                                             : Image(oChannels).moBytes);
+    }
+}
+
+TEST_F(BasicReaderTest, OwnershipOfDatasets)
+{
+    {
+        const BasicReader oReader(MakeDataset().release(), {}, true);
+        const BasicReader oMasks(dynamic_cast<IBitmapDataset*>(MakeDataset().release()), {}, true);
+        EXPECT_GT(moProbe.GetLive(), 2);
+    }
+    EXPECT_EQ(moProbe.GetLive(), 0);
+    const auto oDataset = MakeDataset();
+    {
+        const BasicReader oReader(oDataset.get(), {}, false);
+    }
+    EXPECT_EQ(moProbe.GetLive(), 1);
+}
+
+TEST_F(BasicReaderTest, TilesCoverTheImage)
+{
+    BasicReader oReader(moFile, {2});
+    const ReferenceImage oImage = Image({2});
+    std::mt19937 oRandom(7);
+    for (int nRound = 0; nRound < 30; ++nRound)
+    {
+        const unsigned int nTileWidth = oRandom() % 25;
+        const unsigned int nTileHeight = oRandom() % 25;
+        oReader.SetTileSize(nTileWidth, nTileHeight);
+        EXPECT_EQ(oReader.GetTileWidth(), nTileWidth);
+        std::size_t nPixels = 0;
+        for (const RasterPtr& oTile : RasterRange(oReader))
+        {
+            nPixels += std::size_t(oTile->GetWidth()) * oTile->GetHeight();
+            EXPECT_EQ(Bytes(*oTile),
+                      oImage.Window(oTile->GetX(), oTile->GetY(), oTile->GetWidth(), oTile->GetHeight()));
+            EXPECT_LE(oTile->GetWidth(), std::max(1u, nTileWidth));
+            const RasterPtr oFound(*oReader.FindRaster(oTile->GetX() + oTile->GetWidth() - 1, oTile->GetY()));
+            EXPECT_EQ(oFound->GetContext(), oTile->GetContext());
+        }
+        EXPECT_EQ(nPixels, 21u * 17u) << nTileWidth << " x " << nTileHeight;
+        EXPECT_EQ(oReader.FindRaster(21, 0), oReader.End());
+        EXPECT_THROW(RasterPtr(oReader.GetRaster(oReader.GetTileCount())), krv::OutOfBoundsException);
+    }
+    oReader.SetOptimalTileSize();
+    EXPECT_EQ(oReader.GetTileHeight(), 6u);
+}
+
+TEST_F(BasicReaderTest, MarginsAreLimitedToHalfTheImage)
+{
+    moModel->mnWidth = moModel->mnHeight = 5;
+    BasicReader oReader(moFile);
+    oReader.SetMargins(2, 2, eMirror);
+    const struct
+    {
+        unsigned int mnX;
+        unsigned int mnY;
+        eMarginBehaviour meBehaviour;
+        bool mbAccepted;
+    } CASES[] = {
+        {3, 0, eMirror, false}, {0, 3, eException, false}, {3, 3, eReplicate, true},        {2, 2, eWrap, true},
+        {3, 0, eWrap, false},   {2, 3, eMirror101, false}, {1u << 31, 0, eConstant, false}, {1, 0, eException, true}};
+    for (const auto& oCase : CASES)
+    {
+        const auto Set = [&]
+        {
+            oReader.SetMargins(oCase.mnX, oCase.mnY, oCase.meBehaviour);
+        };
+        const unsigned int nFormerX = oReader.GetXMargin();
+        const unsigned int nFormerY = oReader.GetYMargin();
+        EXPECT_EQ(Error(Set), oCase.mbAccepted ? "" : "data: Margins can't be wider than half of the file");
+        EXPECT_EQ(oReader.GetXMargin(), oCase.mbAccepted ? oCase.mnX : nFormerX);
+        EXPECT_EQ(oReader.GetYMargin(), oCase.mbAccepted ? oCase.mnY : nFormerY);
+        EXPECT_EQ(oReader.GetMarginBehaviour(), oCase.meBehaviour); // stored even when refused
+    }
+    // Rasters keep the margins they were made with.
+    oReader.SetMargins(1, 2, eReplicate);
+    const RasterPtr oRaster(oReader.GetRaster(0));
+    oReader.SetMargins(0, 0, eReplicate);
+    EXPECT_EQ(oRaster->GetXMargin(), 1u);
+    EXPECT_EQ(oRaster->GetYMargin(), 2u);
+}
+
+TEST_F(BasicReaderTest, RandomWindowsWithMarginsEqualTheNaiveModel)
+{
+    const krv::gobs::NativeDataTypeCode TYPES[] = {krv::gobs::eDT_8U, krv::gobs::eDT_16S, krv::gobs::eDT_C16U,
+                                                   krv::gobs::eDT_C64R};
+    const eMarginBehaviour BEHAVIOURS[] = {eReplicate, eMirror, eMirror101, eConstant, eWrap};
+    for (unsigned int nSeed = 1; nSeed <= 400; ++nSeed)
+    {
+        std::mt19937 oRandom(nSeed);
+        const auto Up = [&](unsigned int nLimit)
+        {
+            return static_cast<unsigned int>(oRandom() % (nLimit + 1));
+        };
+        moModel->mnWidth = 1 + Up(11);
+        moModel->mnHeight = 1 + Up(11);
+        moModel->moTypes.assign(3, TYPES[nSeed % 4]);
+        const Channels oChannels(1 + Up(2), 1 + Up(2));
+        BasicReader oReader(moFile, oChannels);
+        const ReferenceImage oImage = Image(oChannels);
+        for (int nWindow = 0; nWindow < 20; ++nWindow)
+        {
+            const unsigned int nX = Up(moModel->mnWidth - 1);
+            const unsigned int nY = Up(moModel->mnHeight - 1);
+            const unsigned int nWidth = 1 + Up(moModel->mnWidth - nX - 1);
+            const unsigned int nHeight = 1 + Up(moModel->mnHeight - nY - 1);
+            const unsigned int nXMargin = Up(1) * Up(2 * moModel->mnWidth);
+            const unsigned int nYMargin = Up(1) * Up(2 * moModel->mnHeight);
+            const eMarginBehaviour eBehaviour = BEHAVIOURS[Up(4)];
+            oReader.SetMargins(0, 0, eBehaviour); // the raster's own margins count
+            krv::gobs::Raster oRaster({nWidth, nHeight, oReader.GetChansCount(), oReader.GetDataType()},
+                                      {static_cast<int>(nX), static_cast<int>(nY), nXMargin, nYMargin});
+            oReader.ReadRaster(&oRaster);
+            ASSERT_EQ(Bytes(oRaster), oImage.WithMargins(nX, nY, nWidth, nHeight, nXMargin, nYMargin, eBehaviour))
+                << "seed " << nSeed << ", window " << nX << "," << nY << " " << nWidth << "x" << nHeight << " of "
+                << moModel->mnWidth << "x" << moModel->mnHeight << ", margins " << nXMargin << "," << nYMargin
+                << ", behaviour " << eBehaviour;
+        }
+    }
+}
+
+// Which form of the transfer serves a window, and when the border is an error.
+TEST_F(BasicReaderTest, BordersAndTheirExceptions)
+{
+    const struct
+    {
+        const char* mpWhat;
+        int mnX, mnY;
+        unsigned int mnWidth, mnHeight, mnXMargin, mnYMargin;
+        bool mbBorder;
+    } CASES[] = {
+        {"no margins, whole image", 0, 0, 21, 17, 0, 0, false},
+        {"no margins, last pixel", 20, 16, 1, 1, 0, 0, false},
+        {"interior", 5, 5, 4, 4, 1, 1, false},
+        {"left margin begins at the edge", 3, 5, 4, 4, 3, 1, false},
+        {"left margin partly outside", 2, 5, 4, 4, 3, 1, true},
+        {"top margin partly outside", 5, 0, 4, 4, 1, 1, true},
+        {"right margin one short of the edge", 15, 5, 4, 4, 1, 1, false},
+        {"right margin ends at the edge", 16, 5, 4, 4, 1, 1, true},
+        {"bottom margin one short of the edge", 5, 10, 4, 5, 1, 1, false},
+        {"bottom margin ends at the edge", 5, 11, 4, 5, 1, 1, true},
+        {"last rows without a margin of their own", 5, 13, 4, 4, 2, 0, true},
+        {"last columns without a margin of their own", 17, 5, 4, 4, 0, 2, true},
+        {"first rows without a margin of their own", 5, 0, 4, 4, 2, 0, false},
+    };
+    BasicReader oReader(moFile, {1});
+    for (const auto& oCase : CASES)
+    {
+        SCOPED_TRACE(oCase.mpWhat);
+        krv::gobs::Raster oRaster({oCase.mnWidth, oCase.mnHeight, 1, oReader.GetDataType()},
+                                  {oCase.mnX, oCase.mnY, oCase.mnXMargin, oCase.mnYMargin});
+        oReader.SetMargins(0, 0, eException);
+        EXPECT_EQ(Error([&] { oReader.ReadRaster(&oRaster); }),
+                  oCase.mbBorder ? "data: Margin behaviour is eException" : "");
+        oReader.SetMargins(0, 0, eMirror);
+        moProbe.Arm(0);
+        oReader.ReadRaster(&oRaster);
+        EXPECT_EQ(moProbe.GetCalls(),
+                  std::vector<std::string>{oCase.mbBorder ? "IO::ReadWindow/long" : "IO::ReadWindow/short"});
+    }
+}
+
+TEST_F(BasicReaderTest, PositionsBeyond32BitsAreRefusedBeforeReading)
+{
+    constexpr int LAST = std::numeric_limits<int>::max();
+    BasicReader oReader(moFile, {1});
+    unsigned char aBuffer[8] = {};
+    moProbe.Arm(0);
+    const krv::gobs::RasterContext CONTEXTS[] = {
+        {LAST, 0, 1, 0}, {0, LAST, 0, 1}, {-LAST - 1, 0, 1, 0}, {0, 0, 1u << 31, 1}, {0, 0, 1, 1u << 30}};
+    for (const auto& oContext : CONTEXTS)
+    {
+        krv::gobs::Raster oRaster({1, 1, 1, oReader.GetDataType()}, oContext, aBuffer, false);
+        EXPECT_THROW(oReader.ReadRaster(&oRaster), krv::DataException)
+            << oContext.GetX() << " " << oContext.GetXMargin();
+    }
+    EXPECT_TRUE(moProbe.GetCalls().empty());
+}
+
+TEST_F(BasicReaderTest, IncompatibleRastersAreRefusedBeforeReading)
+{
+    using krv::gobs::DataType;
+    BasicReader oReader(moFile, {1, 2});
+    moProbe.Arm(0);
+    EXPECT_NE(Error([&] { oReader.ReadRaster(nullptr); }), "");
+    krv::gobs::Raster oChannels({2, 2, 3, krv::gobs::eDT_8U}, {});
+    const std::string channels = Error([&] { oReader.ReadRaster(&oChannels); });
+    EXPECT_NE(channels.find("3"), std::string::npos) << channels; // found; the count comes before the type
+    EXPECT_NE(channels.find("2"), std::string::npos) << channels; // expected
+    EXPECT_EQ(channels.find("8U"), std::string::npos) << channels;
+    const DataType TYPES[] = {{8, false, false, 0, 0, false},  {16, true, false, 0, 0, false},
+                              {16, false, true, 0, 0, false},  {16, false, false, 1, 0, false},
+                              {16, false, false, 0, 1, false}, {16, false, false, 0, 0, true}};
+    for (const DataType& oType : TYPES)
+    {
+        krv::gobs::Raster oRaster({2, 2, 2, oType}, {});
+        const std::string error = Error([&] { oReader.ReadRaster(&oRaster); });
+        EXPECT_EQ(error.substr(0, 6), "data: ");
+        EXPECT_NE(error.find(oType.Describe()), std::string::npos) << error;
+        EXPECT_NE(error.find("16U"), std::string::npos) << error;
+    }
+    EXPECT_TRUE(moProbe.GetCalls().empty());
+}
+
+TEST_F(BasicReaderTest, GeocodingIsScaledToTheLevel)
+{
+    using krv::ogc::cs::GeocodingInfo;
+    using GeocodingPtr = std::unique_ptr<GeocodingInfo>;
+    moModel->moGeocoding = GeocodingInfo(1000, 30, -2, 5000, 3, -20);
+    moModel->mnWidth = 20;
+    BasicReader oReader(moFile);
+    EXPECT_EQ(*GeocodingPtr(oReader.GetGeocodingInfo()), moModel->moGeocoding);
+    const std::unique_ptr<IOverviewReaderAccessor> oAccessor(oReader.GetOverviewReaderAccessor());
+    const std::unique_ptr<IRasterReader> oLevel(oAccessor->CreateRasterReader(4)); // 5 x 5 of 20 x 17
+    const double nY = 17.0 / 5;
+    EXPECT_EQ(*GeocodingPtr(oLevel->GetGeocodingInfo()), GeocodingInfo(1000, 120, -2 * nY, 5000, 12, -20 * nY));
+
+    Synthetic<DatasetPart, GeocodedPart, BitmapPart> oMasks(moModel);
+    EXPECT_EQ(*GeocodingPtr(BasicReader((IBitmapDataset*)&oMasks, {2}, false).GetGeocodingInfo()),
+              moModel->moGeocoding);
+    Synthetic<DatasetPart, RasterPart> oPlain(moModel);
+    EXPECT_EQ(BasicReader((IDataset*)&oPlain, {}, false).GetGeocodingInfo(), nullptr);
+}
+
+TEST_F(BasicReaderTest, MetadataFollowsTheReadersChannels)
+{
+    const AuxiliaryData oData = BasicReader(moFile, {3, 1}).GetAuxiliaryData();
+    EXPECT_EQ(oData.GetFileMetadataValue("SCENE"), "alps");
+    ASSERT_EQ(oData.GetChannelCount(), 2u);
+    EXPECT_EQ(oData.GetChanMetadataValue("band", 1), "b3");
+    EXPECT_EQ(oData.GetChannelDescription(1), "channel 3");
+    EXPECT_EQ(oData.GetChanMetadataValue("band", 2), "b1");
+    EXPECT_EQ(oData.GetChannelDescription(2), "channel 1");
+
+    const auto oDataset = MakeDataset();
+    const BasicReader oMasks(dynamic_cast<IBitmapDataset*>(oDataset.get()), {7, 2}, false);
+    const AuxiliaryData oMaskData = oMasks.GetAuxiliaryData();
+    EXPECT_EQ(oMaskData.GetFileMetadataValue("scene"), "alps");
+    EXPECT_EQ(oMaskData.GetChannelDescription(1), "water");
+    EXPECT_EQ(oMaskData.GetChanMetadataValue("bitmap", 1), "7");
+    EXPECT_EQ(oMaskData.GetChannelDescription(2), "clouds");
+    EXPECT_EQ(oMaskData.GetChanMetadataValue("band", 2), "");
+}
+
+TEST_F(BasicReaderTest, IteratorsStepOverTheEnd)
+{
+    BasicReader oReader(moFile);
+    const unsigned int nCount = oReader.GetTileCount();
+    EXPECT_EQ(oReader.End(), RasterIterator(&oReader, nCount + 5));
+    EXPECT_EQ(--oReader.Begin(), oReader.End());
+    EXPECT_EQ(++RasterIterator(&oReader, nCount - 1), oReader.End());
+    EXPECT_EQ(++oReader.End(), oReader.End());
+    EXPECT_EQ(--oReader.End(), RasterIterator(&oReader, nCount - 1));
+    RasterIterator oStep = oReader.Begin();
+    EXPECT_EQ(oStep++, oReader.Begin());
+    EXPECT_EQ(oStep, RasterIterator(&oReader, 1));
+    EXPECT_EQ(oStep--, RasterIterator(&oReader, 1));
+    EXPECT_EQ(oStep, oReader.Begin());
+    BasicReader oOther(moFile);
+    EXPECT_NE(oReader.Begin(), oOther.Begin());
+    EXPECT_NE(RasterPtr(*oStep).get(), nullptr);
+
+    moModel->mnWidth = 0;
+    BasicReader oNothing(moFile);
+    EXPECT_EQ(oNothing.GetTileCount(), 0u);
+    EXPECT_EQ(oNothing.Begin(), oNothing.End());
+    EXPECT_EQ(++oNothing.Begin(), oNothing.End());
+    EXPECT_EQ(--oNothing.Begin(), oNothing.End());
+}

@@ -1,0 +1,186 @@
+#include "datasources/reader/multitypereader.h"
+
+#include "datasources/reader/defaultreader.h"
+#include "datasources/reader/multitypeoverviewreaderaccessor.h"
+#include "tests/datasources/reader/readertest.h"
+#include "tests/support/outputcapture.h"
+
+#include <cmath>
+#include <cstring>
+
+namespace krv::test
+{
+
+namespace
+{
+
+using krv::datasources::BasicReader;
+using krv::datasources::CreateDefaultReader;
+using krv::datasources::IRasterReader;
+using krv::datasources::MultiTypeReader;
+using krv::gobs::DataType;
+
+class MultiTypeReaderTest : public ReaderTest
+{
+protected:
+    MultiTypeReaderTest() { moModel->moTypes = {krv::gobs::eDT_8U, krv::gobs::eDT_16U, krv::gobs::eDT_8U}; }
+
+    // Channel nPosition of a raster of 32-bit reals.
+    static std::vector<float> Channel(const krv::gobs::Raster& oRaster, unsigned int nPosition)
+    {
+        std::vector<float> oValues;
+        const auto nPixels = oRaster.GetFullWidth() * oRaster.GetFullHeight();
+        for (std::uint64_t nPixel = 0; nPixel < nPixels; ++nPixel)
+        {
+            float nValue = 0;
+            std::memcpy(&nValue, oRaster.GetBuffer() + (nPixel * oRaster.GetChansCount() + nPosition) * 4, 4);
+            oValues.push_back(nValue);
+        }
+        return oValues;
+    }
+
+    // The same pixels of one file channel through a reader of its own.
+    std::vector<float> Expected(unsigned int nFileChannel, const krv::gobs::Raster& oRaster)
+    {
+        BasicReader oReader(moFile, Channels{nFileChannel});
+        krv::gobs::Raster oSingle({oRaster.GetWidth(), oRaster.GetHeight(), 1, oReader.GetDataType()},
+                                  oRaster.GetContext());
+        oReader.ReadRaster(&oSingle);
+        std::vector<float> oValues;
+        const auto nPixels = oSingle.GetFullWidth() * oSingle.GetFullHeight();
+        for (std::uint64_t nPixel = 0; nPixel < nPixels; ++nPixel)
+        {
+            std::uint16_t nWide = oSingle.GetBuffer()[nPixel];
+            if (oReader.GetDataType() == DataType(krv::gobs::eDT_16U))
+                std::memcpy(&nWide, oSingle.GetBuffer() + 2 * nPixel, 2);
+            oValues.push_back(nWide);
+        }
+        return oValues;
+    }
+};
+
+} // namespace
+
+TEST_F(MultiTypeReaderTest, ChannelsAreConvertedAndPlaced)
+{
+    const DataType oReal(krv::gobs::eDT_32R);
+    const auto dataset = MakeDataset();
+    for (const auto ePlacement : {krv::datasources::eFromFirstPlace, krv::datasources::eOwnPlace})
+    {
+        MultiTypeReader oReader(dataset.get(), {1, 2, 3}, oReal, ePlacement);
+        oReader.SetMargins(2, 1, eMirror);
+        for (auto oTile = oReader.Begin(); oTile != oReader.End(); ++oTile)
+        {
+            const RasterPtr oRaster(*oTile);
+            if (ePlacement == krv::datasources::eOwnPlace)
+            {
+                for (unsigned int nPosition = 0; nPosition < 3; ++nPosition)
+                    ASSERT_EQ(Channel(*oRaster, nPosition), Expected(nPosition + 1, *oRaster));
+                continue;
+            }
+            // The 8-bit group has the places 0 and 2 and lands on 0 and 1; the 16-bit one follows on 1; nothing on 2.
+            ASSERT_EQ(Channel(*oRaster, 0), Expected(1, *oRaster));
+            ASSERT_EQ(Channel(*oRaster, 1), Expected(2, *oRaster));
+            ASSERT_EQ(Channel(*oRaster, 2), std::vector<float>(Channel(*oRaster, 2).size(), 0.0F));
+        }
+    }
+}
+
+TEST_F(MultiTypeReaderTest, TypesArePromotedOrRequestedWithAWarning)
+{
+    const auto dataset = MakeDataset();
+    EXPECT_EQ(MultiTypeReader(dataset.get(), {1, 2}).GetDataType(), DataType(krv::gobs::eDT_16U));
+    EXPECT_EQ(MultiTypeReader(dataset.get(), {1, 3}).GetDataType(), DataType(krv::gobs::eDT_8U));
+    OutputCapture oOutput;
+    EXPECT_EQ(MultiTypeReader(dataset.get(), {1, 2}, krv::gobs::eDT_32R).GetDataType(), DataType(krv::gobs::eDT_32R));
+    EXPECT_TRUE(oOutput.moWarnings.empty());
+    EXPECT_EQ(MultiTypeReader(dataset.get(), {2, 1}, krv::gobs::eDT_8U).GetDataType(), DataType(krv::gobs::eDT_8U));
+    ASSERT_EQ(oOutput.moWarnings.size(), 1u);
+    EXPECT_EQ(oOutput.moWarnings[0].moMessage,
+              "Lost of information possible due to data type promotion provided by this reader.");
+    EXPECT_NE(Error([&] { MultiTypeReader(dataset.get(), {1, 2}, krv::gobs::eDT_BIT); }), "");
+}
+
+TEST_F(MultiTypeReaderTest, RefusalsSayWhatIsWrong)
+{
+    const auto dataset = MakeDataset();
+    krv::datasources::IDataset* const poNone = nullptr;
+    EXPECT_EQ(Error([&] { MultiTypeReader(dataset.get(), {}); }), "data: Channels list is empty");
+    EXPECT_EQ(Error([&] { MultiTypeReader(moFile, {}); }), "data: Channels list is empty");
+    EXPECT_EQ(Error([&] { MultiTypeReader(poNone, {1}); }), "data: This Dataset doesn't supports Raster.");
+    EXPECT_EQ(Error([&] { MultiTypeReader(dataset.get(), std::vector<IRasterReader*>{}, {1}); }),
+              "data: Number of readers should the same as the number of channels");
+    MultiTypeReader oReader(dataset.get(), {1, 2});
+    krv::gobs::Raster oThree({4, 4, 3, krv::gobs::eDT_64R}, {0, 0});
+    krv::gobs::Raster oOther({4, 4, 2, krv::gobs::eDT_64R}, {0, 0});
+    EXPECT_EQ(
+        Error([&] { oReader.ReadRaster(&oThree); }),
+        "data: The number of channels in the requested Rasterdoesn't match the number of channel of this Reader.");
+    EXPECT_EQ(Error([&] { oReader.ReadRaster(&oOther); }),
+              "data: The data type in the requested Rasterdoesn't match the data type of this Reader.");
+    // A refused margin leaves all groups in step.
+    EXPECT_NE(Error([&] { oReader.SetMargins(50, 50, eMirror); }), "");
+    const RasterPtr oRaster(oReader.GetRaster(0));
+    EXPECT_EQ(oRaster->GetXMargin(), 0u);
+    moMakeDataset = [this]() -> std::unique_ptr<krv::datasources::IDataset>
+    {
+        return std::make_unique<DatasetWithoutRaster>(moModel);
+    };
+    EXPECT_EQ(Error([&] { MultiTypeReader(moFile, {1}); }), "data: Format does not support rasters: file=" + moFile);
+}
+
+TEST_F(MultiTypeReaderTest, LevelsAndReadyMadeReadersMakeOneImage)
+{
+    moModel->moLevels = {2};
+    const auto dataset = MakeDataset();
+    MultiTypeReader oReader(dataset.get(), {1, 2, 3}, krv::gobs::eDT_32R, krv::datasources::eOwnPlace);
+    const std::unique_ptr<krv::datasources::IOverviewReaderAccessor> oLevels(oReader.GetOverviewReaderAccessor());
+    ASSERT_EQ(oLevels->GetLevels(), std::vector<unsigned int>{2});
+    const std::unique_ptr<IRasterReader> oLevel(oLevels->CreateRasterReader(2));
+    EXPECT_EQ(oLevel->GetWidth(), moModel->LevelWidth(2));
+    EXPECT_EQ(oLevel->GetDataType(), DataType(krv::gobs::eDT_32R));
+    EXPECT_EQ(oLevel->GetOverviewReaderAccessor(), nullptr);
+    const RasterPtr oRaster(oLevel->ReadRaster(0, 0, oLevel->GetWidth(), oLevel->GetHeight()));
+    const std::string wide = LevelImage(*moModel, 2, {2});
+    const auto oSecond = Channel(*oRaster, 1);
+    for (std::size_t nPixel = 0; nPixel < oSecond.size(); ++nPixel)
+    {
+        std::uint16_t nValue = 0;
+        std::memcpy(&nValue, wide.data() + 2 * nPixel, 2);
+        ASSERT_EQ(oSecond[nPixel], nValue);
+    }
+}
+
+// Nothing is left behind by a failure at any call, through the reader that is chosen and through the fallback.
+TEST_F(MultiTypeReaderTest, DefaultReaderIsChosenAndFailuresLeaveNothing)
+{
+    {
+        const std::unique_ptr<IRasterReader> oSame(CreateDefaultReader(moFile, {1, 3}));
+        EXPECT_NE(dynamic_cast<BasicReader*>(oSame.get()), nullptr);
+        const std::unique_ptr<IRasterReader> oMixed(CreateDefaultReader(moFile, {1, 2}));
+        ASSERT_NE(dynamic_cast<MultiTypeReader*>(oMixed.get()), nullptr);
+        EXPECT_EQ(oMixed->GetDataType(), DataType(krv::gobs::eDT_16U));
+    }
+    EXPECT_EQ(Error([&] { CreateDefaultReader(moFile, {}); }), "data: Channels list is empty");
+    unsigned int nChannel = 7;
+    unsigned int nIndex = 8;
+    std::string name = "as it was";
+    EXPECT_FALSE(krv::datasources::GetPCTParameters(nullptr, {1}, nChannel, name, nIndex));
+    EXPECT_EQ(name + std::to_string(nChannel) + std::to_string(nIndex), "as it was78");
+    bool bThrown = true;
+    for (unsigned int nCall = 1; bThrown; ++nCall)
+    {
+        moProbe.Arm(nCall);
+        const auto ReadMixed = [&]
+        {
+            const std::unique_ptr<IRasterReader> oReader(CreateDefaultReader(moFile, {2, 1}));
+            const RasterPtr oRaster(oReader->GetRaster(0));
+        };
+        Error(ReadMixed);
+        bThrown = moProbe.HasThrown();
+        ASSERT_EQ(moProbe.GetLive(), 0) << "call " << nCall;
+        ASSERT_FALSE(moProbe.HasOrphans()) << "call " << nCall;
+    }
+}
+
+} // namespace krv::test

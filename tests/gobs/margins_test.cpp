@@ -1,0 +1,162 @@
+#include "gobs/raster/margins.h"
+#include "gobs/raster/raster.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <gtest/gtest.h>
+
+#include <random>
+#include <string>
+#include <vector>
+
+using namespace krv;
+using namespace krv::gobs;
+
+namespace
+{
+
+// Walks back into the line step by step, the way the behaviour is told: clamp, reflect, step over by a line.
+long long NaiveFold(long long k, long long n, eMarginBehaviour eBehaviour)
+{
+    while (k < 0 || k >= n)
+        switch (eBehaviour)
+        {
+        case eReplicate:
+            k += k < 0 ? 1 : -1;
+            break;
+        case eMirror:
+            k = k < 0 ? -1 - k : 2 * n - 1 - k;
+            break;
+        case eMirror101:
+            k = n == 1 ? 0 : k < 0 ? -k : 2 * (n - 1) - k;
+            break;
+        default:
+            k += k < 0 ? n : -n;
+        }
+    return k;
+}
+
+// The pixels of a raster as whole numbers that do not depend on how it packs them.
+std::vector<std::string> Pixels(const Raster& oRaster)
+{
+    const std::uint64_t nPixelBits = oRaster.GetDataType().GetValueBits() * oRaster.GetChansCount();
+    std::vector<std::string> oPixels(oRaster.GetFullWidth() * oRaster.GetFullHeight());
+    for (std::size_t i = 0; i < oPixels.size(); ++i)
+        for (std::uint64_t nBit = i * nPixelBits; nBit < (i + 1) * nPixelBits; ++nBit)
+            oPixels[i] += oRaster.GetBuffer()[nBit / 8] & (128 >> nBit % 8) ? '1' : '0';
+    return oPixels;
+}
+
+struct Line
+{
+    long long mnFirst;
+    long long mnValid;
+
+    Line(long long nFull, long long nMargin, bool bLow, bool bHigh)
+        : mnFirst(bLow ? nMargin : 0), mnValid(nFull - mnFirst - (bHigh ? nMargin : 0))
+    {
+    }
+    bool Has(long long k) const { return k >= mnFirst && k < mnFirst + mnValid; }
+};
+
+void ExpectFilled(const std::vector<std::string>& oBefore, const Raster& oAfter, eMarginBehaviour eBehaviour,
+                  unsigned int nSides, const std::string& sCase)
+{
+    const auto nWidth = static_cast<long long>(oAfter.GetFullWidth());
+    const auto nHeight = static_cast<long long>(oAfter.GetFullHeight());
+    const Line oX(nWidth, oAfter.GetXMargin(), nSides & 2, nSides & 1);
+    const Line oY(nHeight, oAfter.GetYMargin(), nSides & 4, nSides & 8);
+    const std::vector<std::string> oPixels = Pixels(oAfter);
+    for (long long nRow = 0; nRow < nHeight; ++nRow)
+        for (long long nColumn = 0; nColumn < nWidth; ++nColumn)
+        {
+            const long long nFrom = (NaiveFold(nRow - oY.mnFirst, oY.mnValid, eBehaviour) + oY.mnFirst) * nWidth +
+                                    oX.mnFirst + NaiveFold(nColumn - oX.mnFirst, oX.mnValid, eBehaviour);
+            std::string sExpected = oBefore[static_cast<std::size_t>(nFrom)];
+            if (eBehaviour == eConstant && !(oX.Has(nColumn) && oY.Has(nRow)))
+                sExpected.assign(sExpected.size(), '0');
+            ASSERT_EQ(oPixels[static_cast<std::size_t>(nRow * nWidth + nColumn)], sExpected)
+                << sCase << ", column " << nColumn << ", row " << nRow;
+        }
+}
+
+std::string FillLine(std::string sLine, unsigned int nMargin, eMarginBehaviour eBehaviour)
+{
+    const auto nWidth = static_cast<unsigned int>(sLine.size());
+    sLine = std::string(nMargin, '?') + sLine + std::string(nMargin, '?');
+    Raster oRaster(RasterInfo(nWidth, 1, 1, DataType(eDT_8U)), RasterContext(0, 0, nMargin, 0),
+                   reinterpret_cast<unsigned char*>(sLine.data()), false);
+    FillRasterMargins(&oRaster, eBehaviour, eRightSide | eLeftSide);
+    return sLine;
+}
+
+} // namespace
+
+TEST(FillRasterMarginsTest, WorkedLines)
+{
+    EXPECT_EQ(FillLine("1234", 3, eReplicate), "1111234444");
+    EXPECT_EQ(FillLine("1234", 3, eMirror), "3211234432");
+    EXPECT_EQ(FillLine("1234", 3, eMirror101), "4321234321");
+    EXPECT_EQ(FillLine("1234", 3, eWrap), "2341234123");
+    EXPECT_EQ(FillLine("12", 5, eMirror), "112211221122");
+    EXPECT_EQ(FillLine("7", 3, eMirror101), "7777777");
+    EXPECT_EQ(FillLine("12", 1, eConstant), std::string("\0", 1) + "12" + std::string("\0", 1));
+}
+
+TEST(FillRasterMarginsTest, EveryBehaviourSideAndPixelSizeLikeTheNaiveModel)
+{
+    const unsigned int nSeed = 20240501;
+    std::mt19937 oRandom(nSeed);
+    constexpr eMarginBehaviour BEHAVIOURS[] = {eReplicate, eMirror, eMirror101, eConstant, eWrap};
+    constexpr NativeDataTypeCode TYPES[] = {eDT_8U, eDT_16S, eDT_32R, eDT_64R, eDT_C64R, eDT_BIT};
+    for (NativeDataTypeCode eType : TYPES)
+        for (unsigned int nChannels : {1u, 2u, 3u, 5u, 8u})
+            for (eMarginBehaviour eBehaviour : BEHAVIOURS)
+                for (unsigned int nSides = 0; nSides < 16; ++nSides)
+                {
+                    const RasterInfo oInfo(1 + oRandom() % 6, 1 + oRandom() % 6, nChannels, DataType(eType));
+                    const RasterContext oContext(0, 0, oRandom() % 8, oRandom() % 8);
+                    Raster oRaster(oInfo, oContext);
+                    for (std::uint64_t i = 0; i < oRaster.GetBufferSize(); ++i)
+                        oRaster.GetBuffer()[i] = static_cast<unsigned char>(oRandom());
+                    const std::vector<std::string> oBefore = Pixels(oRaster);
+                    FillRasterMargins(&oRaster, eBehaviour, nSides);
+                    ExpectFilled(oBefore, oRaster, eBehaviour, nSides,
+                                 "seed " + std::to_string(nSeed) + ", " + DataType(eType).Describe() + " x " +
+                                     std::to_string(nChannels) + ", behaviour " + std::to_string(eBehaviour) +
+                                     ", sides " + std::to_string(nSides));
+                }
+}
+
+TEST(FillRasterMarginsTest, MarginsWiderThanOneBatchOfColumns)
+{
+    Raster oRaster(RasterInfo(3, 2, 1, DataType(eDT_16U)), RasterContext(0, 0, 700, 1));
+    auto* pValues = reinterpret_cast<unsigned short*>(oRaster.GetBuffer());
+    for (std::uint64_t i = 0; i < oRaster.GetBufferSize() / 2; ++i)
+        pValues[i] = static_cast<unsigned short>(i);
+    const std::vector<std::string> oBefore = Pixels(oRaster);
+    FillRasterMargins(&oRaster, eMirror, 15);
+    ExpectFilled(oBefore, oRaster, eMirror, 15, "wide margins");
+}
+
+TEST(FillRasterMarginsTest, RefusesWhatItCannotMake)
+{
+    Raster oRaster(RasterInfo(2, 2, 1, DataType(eDT_8U)), RasterContext(0, 0, 1, 1));
+    for (int nBehaviour : {0, 5, 7, -1})
+        EXPECT_THROW(FillRasterMargins(&oRaster, static_cast<eMarginBehaviour>(nBehaviour), 15), ParameterException);
+    Raster oEmpty(RasterInfo(0, 2, 1, DataType(eDT_8U)), RasterContext(0, 0, 1, 1));
+    EXPECT_THROW(FillRasterMargins(&oEmpty, eReplicate, 3), ParameterException);
+    EXPECT_NO_THROW(FillRasterMargins(&oEmpty, eReplicate, 0));
+    EXPECT_THROW(FillRasterMargins(nullptr, eReplicate, 0), DataException);
+    EXPECT_THROW(FoldIndex(0, 0, eMirror), ParameterException);
+    EXPECT_THROW(FoldIndex(0, 1, eConstant), ParameterException);
+}
+
+TEST(FoldIndexTest, FoldsFarIndices)
+{
+    for (eMarginBehaviour eBehaviour : {eReplicate, eMirror, eMirror101, eWrap})
+        for (long long n = 1; n < 6; ++n)
+            for (long long k = -30; k < 30; ++k)
+                EXPECT_EQ(FoldIndex(k, n, eBehaviour), NaiveFold(k, n, eBehaviour)) << k << " of " << n;
+    EXPECT_EQ(FoldIndex(-1, 1ll << 34, eMirror), 0);
+    EXPECT_EQ(FoldIndex(-(1ll << 40), (1ll << 34) - 1, eWrap), (1ll << 34) - 1 - 64);
+}

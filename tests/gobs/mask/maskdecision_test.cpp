@@ -1,0 +1,310 @@
+#include "gobs/mask/maskdecision.h"
+
+#include "gobs/mask/exactmaskdecision.h"
+#include "gobs/mask/mask.h"
+#include "gobs/raster/raster.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <complex>
+#include <cstring>
+#include <limits>
+#include <memory>
+#include <random>
+#include <string>
+#include <vector>
+
+namespace krv::gobs
+{
+
+namespace
+{
+
+constexpr double NOT_A_NUMBER = std::numeric_limits<double>::quiet_NaN();
+
+// Real and imaginary part of a sample; few values, so that matches are common.
+using Parts = std::complex<double>;
+
+template <class Part>
+void AppendPart(std::vector<unsigned char>& oBytes, double nValue)
+{
+    const auto nPart = static_cast<Part>(nValue);
+    const auto* pPart = reinterpret_cast<const unsigned char*>(&nPart);
+    oBytes.insert(oBytes.end(), pPart, pPart + sizeof nPart);
+}
+
+void AppendSample(std::vector<unsigned char>& oBytes, NativeDataTypeCode eType, const Parts& oSample)
+{
+    using Append = void (*)(std::vector<unsigned char>&, double);
+    static constexpr Append APPEND[] = {
+        &AppendPart<std::uint8_t>,  &AppendPart<std::int8_t>,  &AppendPart<std::uint16_t>, &AppendPart<std::int16_t>,
+        &AppendPart<std::uint32_t>, &AppendPart<std::int32_t>, &AppendPart<float>,         &AppendPart<std::uint64_t>,
+        &AppendPart<std::int64_t>,  &AppendPart<double>,       &AppendPart<std::uint16_t>, &AppendPart<std::int16_t>,
+        &AppendPart<std::int32_t>,  &AppendPart<float>,        &AppendPart<double>};
+    APPEND[eType](oBytes, oSample.real());
+    if (DataType(eType).IsComplex())
+        APPEND[eType](oBytes, oSample.imag());
+}
+
+std::vector<unsigned char> PackBits(const std::vector<Parts>& oSamples)
+{
+    std::vector<unsigned char> oBytes((oSamples.size() + 7) / 8);
+    for (std::size_t n = 0; n < oSamples.size(); ++n)
+    {
+        if (oSamples[n].real() != 0)
+            oBytes[n / 8] = static_cast<unsigned char>(oBytes[n / 8] | 128 >> n % 8);
+    }
+    return oBytes;
+}
+
+std::vector<unsigned char> Encode(NativeDataTypeCode eType, const std::vector<Parts>& oSamples)
+{
+    if (eType == eDT_BIT)
+        return PackBits(oSamples);
+    std::vector<unsigned char> oBytes;
+    for (const Parts& oSample : oSamples)
+        AppendSample(oBytes, eType, oSample);
+    return oBytes;
+}
+
+struct Decision
+{
+    BkgdRule meRule;
+    std::vector<double> moValues;
+    std::vector<unsigned int> moChannels;
+};
+
+bool Equals(const Parts& oSample, double nValue, bool bComplex)
+{
+    if (std::isnan(nValue))
+        return std::isnan(oSample.real()) && (!bComplex || std::isnan(oSample.imag()));
+    return oSample.real() == nValue && (!bComplex || oSample.imag() == 0);
+}
+
+bool IsBackground(const Parts* pPixel, unsigned int nChannels, const Decision& oDecision, bool bComplex)
+{
+    unsigned int nListed = 0;
+    unsigned int nEqual = 0;
+    for (std::size_t n = 0; n < oDecision.moChannels.size(); ++n)
+    {
+        const unsigned int nChannel = oDecision.moChannels[n];
+        if (nChannel < 1 || nChannel > nChannels)
+            continue;
+        ++nListed;
+        nEqual += Equals(pPixel[nChannel - 1], oDecision.moValues[n], bComplex) ? 1 : 0;
+    }
+    return oDecision.meRule == eAnyChannel ? nEqual > 0 : nListed > 0 && nEqual == nListed;
+}
+
+std::vector<unsigned char> Mark(const IMaskDecisionImpl& oImpl, const std::vector<unsigned char>& oPixels,
+                                std::size_t nPixels, unsigned int nChannels)
+{
+    std::vector<unsigned char> oBits((nPixels + 7) / 8 + 1, 0xA5);
+    oImpl.Mark(oPixels.data(), nPixels, nChannels, oBits.data());
+    EXPECT_EQ(oBits.back(), 0xA5) << "written beyond the last byte";
+    oBits.pop_back();
+    return oBits;
+}
+
+class RandomDecisions
+{
+public:
+    explicit RandomDecisions(unsigned int nSeed) : moRandom(nSeed) {}
+
+    std::size_t Below(std::size_t nEnd) { return moRandom() % nEnd; }
+
+    Decision MakeDecision(NativeDataTypeCode eType, unsigned int nChannels)
+    {
+        const double VALUES[] = {0, 1, 1, DataType(eType).IsSigned() ? -1.0 : 1.0, 0.5, NOT_A_NUMBER, 1e30, -1};
+        Decision oDecision{Below(2) == 0 ? eAnyChannel : eAllChannels, {}, {}};
+        const bool bEvery = Below(2) == 0;
+        const bool bPlain = Below(2) == 0;
+        for (std::size_t n = 0; n < (bEvery ? nChannels : Below(4)); ++n)
+        {
+            oDecision.moChannels.push_back(bEvery ? static_cast<unsigned int>(n + 1)
+                                                  : static_cast<unsigned int>(Below(nChannels + 2)));
+            oDecision.moValues.push_back(VALUES[Below(bPlain ? 2 : std::size(VALUES))]);
+        }
+        return oDecision;
+    }
+
+    std::vector<Parts> MakeSamples(NativeDataTypeCode eType, std::size_t nCount)
+    {
+        const DataType oType(eType);
+        std::vector<double> oParts = {0, 1, 1};
+        if (oType.IsSigned())
+            oParts.push_back(-1);
+        if (oType.IsReal())
+            oParts.insert(oParts.end(), {-0.0, 0.5, NOT_A_NUMBER, NOT_A_NUMBER});
+        std::vector<Parts> oSamples(nCount);
+        for (Parts& oSample : oSamples)
+            oSample = {oParts[Below(oParts.size())], oType.IsComplex() ? oParts[Below(oParts.size())] : 0.0};
+        return oSamples;
+    }
+
+private:
+    std::mt19937 moRandom;
+};
+
+template <class Sample>
+bool Marks(NativeDataTypeCode eType, const SampleValue& oValue, Sample nSample, bool bNaNIsBackground = false)
+{
+    const ExactMaskDecision oDecision(eAnyChannel, {oValue}, {1}, bNaNIsBackground);
+    const std::unique_ptr<IMaskDecisionImpl> oImpl(oDecision.GetImpl(eType, 1));
+    std::vector<unsigned char> oPixels(33 * sizeof nSample);
+    for (int n = 0; n < 33; ++n)
+        std::memcpy(oPixels.data() + n * sizeof nSample, &nSample, sizeof nSample);
+    const auto oBits = Mark(*oImpl, oPixels, 33, 1);
+    // Vector and single pixels say the same.
+    EXPECT_EQ(oBits[0], oBits[4] == 0x80 ? 0xFF : 0);
+    return oBits[4] != 0;
+}
+
+} // namespace
+
+TEST(MaskDecision, AgreesWithPixelByPixelComparison)
+{
+    const unsigned int nSeed = 7331;
+    RandomDecisions oRandom(nSeed);
+    for (int nRound = 0; nRound < 6000; ++nRound)
+    {
+        const auto eType = static_cast<NativeDataTypeCode>(oRandom.Below(16));
+        constexpr unsigned int CHANNELS[] = {1, 1, 2, 3, 4, 4, 5, 7, 8, 9, 16, 17, 40};
+        const unsigned int nChannels = CHANNELS[oRandom.Below(std::size(CHANNELS))];
+        const std::size_t nPixels = oRandom.Below(4) == 0 ? oRandom.Below(9) : oRandom.Below(140);
+        const Decision oDecision = oRandom.MakeDecision(eType, nChannels);
+        const auto oSamples = oRandom.MakeSamples(eType, nPixels * nChannels);
+        std::vector<Parts> oExpected(nPixels);
+        for (std::size_t n = 0; n < nPixels; ++n)
+            oExpected[n] = IsBackground(&oSamples[n * nChannels], nChannels, oDecision, DataType(eType).IsComplex());
+        const std::unique_ptr<IMaskDecisionImpl> oImpl(
+            GetMaskDecisionImpl(eType, nChannels, oDecision.meRule, oDecision.moValues, oDecision.moChannels));
+        ASSERT_EQ(Mark(*oImpl, Encode(eType, oSamples), nPixels, nChannels), PackBits(oExpected))
+            << "seed " << nSeed << " round " << nRound << " type " << DataType(eType).Describe() << " channels "
+            << nChannels << " pixels " << nPixels << " rule " << oDecision.meRule << " values "
+            << testing::PrintToString(oDecision.moValues) << " of " << testing::PrintToString(oDecision.moChannels);
+    }
+}
+
+TEST(MaskDecision, ComparesInThePixelsOwnType)
+{
+    constexpr float FLOAT_MAX = std::numeric_limits<float>::max();
+    constexpr float FLOAT_INF = std::numeric_limits<float>::infinity();
+    const auto Real = &SampleValue::FromReal;
+    EXPECT_TRUE(Marks<std::uint8_t>(eDT_8U, Real(255.0), 255));
+    EXPECT_FALSE(Marks<std::uint8_t>(eDT_8U, Real(256.0), 0));
+    EXPECT_FALSE(Marks<std::uint8_t>(eDT_8U, Real(-1.0), 255));
+    EXPECT_FALSE(Marks<std::uint8_t>(eDT_8U, Real(0.5), 0));
+    EXPECT_TRUE(Marks<std::int8_t>(eDT_8S, Real(-128.0), -128));
+    EXPECT_FALSE(Marks<std::int8_t>(eDT_8S, Real(128.0), -128));
+    EXPECT_TRUE(Marks<std::int16_t>(eDT_16S, Real(-32768.0), -32768));
+    EXPECT_FALSE(Marks<std::uint16_t>(eDT_16U, Real(-9999.0), static_cast<std::uint16_t>(-9999)));
+    EXPECT_TRUE(Marks<std::uint32_t>(eDT_32U, Real(4294967295.0), 4294967295u));
+    EXPECT_FALSE(Marks<std::uint32_t>(eDT_32U, Real(4294967296.0), 0));
+    EXPECT_FALSE(Marks<std::int32_t>(eDT_32S, Real(INFINITY), 2147483647));
+    EXPECT_FALSE(Marks<std::int32_t>(eDT_32S, Real(NOT_A_NUMBER), 0));
+
+    EXPECT_TRUE(Marks<float>(eDT_32R, Real(0.1), 0.1f));
+    EXPECT_TRUE(Marks<float>(eDT_32R, Real(-0.0), 0.0f));
+    EXPECT_TRUE(Marks<float>(eDT_32R, Real(-3.4028234663852886e+38), -FLOAT_MAX));
+    EXPECT_TRUE(Marks<float>(eDT_32R, Real(3.40282347e+38), FLOAT_MAX));
+    EXPECT_TRUE(Marks<float>(eDT_32R, Real(3.4028235677973366e+38), FLOAT_MAX));
+    EXPECT_FALSE(Marks<float>(eDT_32R, Real(-1.7976931348623157e+308), -FLOAT_INF));
+    EXPECT_TRUE(Marks<float>(eDT_32R, Real(-INFINITY), -FLOAT_INF));
+    EXPECT_FALSE(Marks<float>(eDT_32R, Real(0.0), NAN));
+    EXPECT_TRUE(Marks<float>(eDT_32R, Real(NOT_A_NUMBER), -NAN));
+    EXPECT_TRUE(Marks<double>(eDT_64R, Real(NOT_A_NUMBER), NOT_A_NUMBER));
+    EXPECT_FALSE(Marks<double>(eDT_64R, Real(0.1), 0.1f));
+
+    using ComplexFloat = std::complex<float>;
+    EXPECT_TRUE(Marks(eDT_C32R, Real(2.0), ComplexFloat(2, -0.0f)));
+    EXPECT_FALSE(Marks(eDT_C32R, Real(2.0), ComplexFloat(2, 1)));
+    EXPECT_FALSE(Marks(eDT_C32R, Real(NOT_A_NUMBER), ComplexFloat(NAN, 0)));
+    EXPECT_TRUE(Marks(eDT_C32R, Real(NOT_A_NUMBER), ComplexFloat(NAN, NAN)));
+}
+
+TEST(MaskDecision, IntegersOf64BitsAreExact)
+{
+    constexpr auto INT_MAX64 = std::numeric_limits<std::int64_t>::max();
+    constexpr auto INT_MIN64 = std::numeric_limits<std::int64_t>::min();
+    constexpr auto UINT_MAX64 = std::numeric_limits<std::uint64_t>::max();
+    constexpr std::int64_t ODD = (std::int64_t{1} << 53) + 1;
+    // A double that stands for the maximum matches it and nothing beside it.
+    EXPECT_TRUE(Marks(eDT_64S, SampleValue::FromReal(9223372036854775808.0), INT_MAX64));
+    EXPECT_FALSE(Marks(eDT_64S, SampleValue::FromReal(9223372036854775808.0), INT_MAX64 - 1));
+    EXPECT_TRUE(Marks(eDT_64S, SampleValue::FromReal(-9223372036854775808.0), INT_MIN64));
+    EXPECT_TRUE(Marks(eDT_64U, SampleValue::FromReal(18446744073709551616.0), UINT_MAX64));
+    EXPECT_FALSE(Marks(eDT_64U, SampleValue::FromReal(18446744073709551616.0), UINT_MAX64 - 1));
+    EXPECT_FALSE(Marks(eDT_64S, SampleValue::FromReal(18446744073709551616.0), INT_MAX64));
+
+    EXPECT_TRUE(Marks(eDT_64S, SampleValue::FromSigned(ODD), ODD));
+    EXPECT_FALSE(Marks(eDT_64S, SampleValue::FromSigned(ODD), ODD - 1));
+    EXPECT_FALSE(Marks(eDT_64S, SampleValue::FromUnsigned(UINT_MAX64), std::int64_t{-1}));
+    EXPECT_TRUE(Marks(eDT_64S, SampleValue::FromSigned(INT_MIN64), INT_MIN64));
+    EXPECT_TRUE(Marks(eDT_64U, SampleValue::FromUnsigned(UINT_MAX64), UINT_MAX64));
+    EXPECT_FALSE(Marks(eDT_64U, SampleValue::FromSigned(-1), UINT_MAX64));
+    EXPECT_FALSE(Marks<std::uint8_t>(eDT_8U, SampleValue::FromUnsigned(256), 0));
+    EXPECT_TRUE(Marks(eDT_64R, SampleValue::FromSigned(ODD), 9007199254740992.0));
+    EXPECT_TRUE(Marks(eDT_32R, SampleValue::FromSigned(-16777217), -16777216.0f));
+}
+
+TEST(MaskDecision, NaNCountsAsBackgroundOnRequestForRealTypes)
+{
+    const auto oZero = SampleValue::FromReal(0.0);
+    EXPECT_FALSE(Marks<float>(eDT_32R, oZero, NAN));
+    EXPECT_TRUE(Marks<float>(eDT_32R, oZero, NAN, true));
+    EXPECT_TRUE(Marks<float>(eDT_32R, oZero, 0.0f, true));
+    EXPECT_FALSE(Marks<float>(eDT_32R, oZero, 1.0f, true));
+    EXPECT_TRUE(Marks<float>(eDT_32R, SampleValue::FromReal(1e300), NAN, true));
+    EXPECT_TRUE(Marks(eDT_C64R, oZero, std::complex<double>(NAN, NAN), true));
+    EXPECT_FALSE(Marks<std::int32_t>(eDT_32S, SampleValue::FromReal(0.5), 0, true));
+}
+
+TEST(MaskDecision, SampleValuesAreWrittenAsTheyAreRead)
+{
+    EXPECT_EQ(SampleValue::FromUnsigned(18446744073709551615u).GetText(), "18446744073709551615");
+    EXPECT_EQ(SampleValue::FromSigned(std::numeric_limits<std::int64_t>::min()).GetText(), "-9223372036854775808");
+    EXPECT_EQ(SampleValue::FromReal(-9999.5).GetText(), "-9999.5");
+    EXPECT_EQ(SampleValue::FromReal(-NOT_A_NUMBER).GetText(), "nan");
+    EXPECT_EQ(SampleValue::FromReal(-INFINITY).GetText(), "-inf");
+    EXPECT_EQ(SampleValue::FromSigned(-3).GetReal(), -3.0);
+}
+
+TEST(MaskDecision, RejectsWhatItCannotMeasure)
+{
+    EXPECT_THROW(MaskDecision(eAnyChannel, {1.0}, {}), krv::DataException);
+    EXPECT_THROW(ExactMaskDecision(eAnyChannel, {}, {1}), krv::DataException);
+    EXPECT_THROW(GetMaskDecisionImpl(eDT_8U, 1, eAnyChannel, {1.0}, {1, 2}), krv::DataException);
+    EXPECT_THROW(MaskDecision(static_cast<BkgdRule>(2), {}, {}), krv::ParameterException);
+    EXPECT_THROW(MaskDecision(eAnyChannel, {}, {}).GetImpl(DataType(), 1), krv::DataException);
+    EXPECT_THROW(MaskDecisionBuilder(nullptr), krv::DataException);
+    const std::unique_ptr<IMaskDecisionImpl> oImpl(MaskDecision(eAnyChannel, {}, {}).GetImpl(eDT_8U, 3));
+    unsigned char nByte = 0;
+    EXPECT_THROW(oImpl->Mark(&nByte, 1, 1, &nByte), krv::DataException);
+}
+
+TEST(MaskDecisionBuilder, CoversTheFullExtentAndOutlivesItsDecision)
+{
+    Raster oRaster(RasterInfo(5, 3, 2, eDT_16S), RasterContext(-2, 7, 2, 1));
+    auto* pValues = reinterpret_cast<std::int16_t*>(oRaster.GetBuffer());
+    for (int n = 0; n < 9 * 5 * 2; ++n)
+        pValues[n] = static_cast<std::int16_t>(n % 7);
+    auto oDecision = std::make_unique<MaskDecision>(eAllChannels, std::vector<double>{3}, std::vector<unsigned int>{2});
+    auto oBuilder = std::make_unique<MaskDecisionBuilder>(oDecision.get());
+    oDecision.reset();
+    const MaskDecisionBuilder oCopy(*oBuilder);
+    oBuilder.reset();
+    const std::unique_ptr<Mask> oMask(oCopy.BuildMask(oRaster));
+    EXPECT_EQ(oMask->GetX(), -2);
+    EXPECT_EQ(oMask->GetFullWidth(), 9u);
+    EXPECT_EQ(oMask->GetFullHeight(), 5u);
+    for (unsigned int nRow = 0; nRow < 5; ++nRow)
+    {
+        for (unsigned int nColumn = 0; nColumn < 9; ++nColumn)
+            EXPECT_EQ(oMask->GetBit(nColumn, nRow), pValues[(nRow * 9 + nColumn) * 2 + 1] == 3);
+    }
+}
+
+} // namespace krv::gobs

@@ -1,0 +1,80 @@
+#include "gobs/tile/tileiterator.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <gtest/gtest.h>
+
+#include <vector>
+
+using namespace krv;
+using namespace krv::gobs;
+
+TEST(TileIteratorTest, TilesCoverTheImageOnceRowByRow)
+{
+    TileIterator oGrid(11, 7);
+    EXPECT_EQ(oGrid.GetTileRange(), 0u);
+    EXPECT_EQ(oGrid.GetTile(0), Tile(0, 0, 11, 7));
+    oGrid.SetChunkSize(4, 3);
+    ASSERT_EQ(oGrid.GetTileRange(), 8u);
+    EXPECT_EQ(oGrid.GetTile(1), Tile(4, 0, 4, 3));
+    EXPECT_EQ(oGrid.GetTile(8), Tile(8, 6, 3, 1));
+    std::vector<int> oTimes(11 * 7);
+    for (unsigned int nIndex = 0; nIndex <= oGrid.GetTileRange(); ++nIndex)
+    {
+        const Tile oTile = oGrid.GetTile(nIndex);
+        for (unsigned int nY = oTile.GetY(); nY < oTile.GetY() + oTile.GetHeight(); ++nY)
+            for (unsigned int nX = oTile.GetX(); nX < oTile.GetX() + oTile.GetWidth(); ++nX)
+            {
+                ++oTimes.at(nY * 11 + nX);
+                EXPECT_EQ(oGrid.GetTileIndex(nX, nY), nIndex);
+            }
+    }
+    EXPECT_EQ(oTimes, std::vector<int>(11 * 7, 1));
+}
+
+TEST(TileIteratorTest, OutsideTheGrid)
+{
+    TileIterator oGrid(11, 7);
+    oGrid.SetChunkSize(4, 3);
+    EXPECT_EQ(oGrid.GetTileIndex(11, 0), 9u);
+    EXPECT_EQ(oGrid.GetTileIndex(0, 7), 9u);
+    EXPECT_EQ(oGrid.GetTileIndex(0xFFFFFFFFu, 0xFFFFFFFFu), 9u);
+    try
+    {
+        oGrid.GetTile(9);
+        FAIL() << "no exception";
+    }
+    catch (const OutOfBoundsException& oError)
+    {
+        EXPECT_EQ(oError.GetIndices(), std::vector<unsigned int>{9});
+    }
+}
+
+TEST(TileIteratorTest, ImagesWithoutPixelsHaveNoTiles)
+{
+    for (const auto& [nWidth, nHeight] : {std::pair{0u, 0u}, {0u, 5u}, {5u, 0u}})
+    {
+        TileIterator oGrid(nWidth, nHeight);
+        oGrid.SetChunkSize(2, 2);
+        EXPECT_EQ(oGrid.GetTileRange(), 4294967295u);
+        EXPECT_EQ(oGrid.GetTileIndex(0, 0), 0u);
+        EXPECT_THROW(oGrid.GetTile(0), OutOfBoundsException);
+    }
+}
+
+TEST(TileIteratorTest, LargestImages)
+{
+    TileIterator oGrid(0xFFFFFFFFu, 0xFFFFFFFFu);
+    EXPECT_THROW(oGrid.SetChunkSize(0, 0), DataException);
+    EXPECT_EQ(oGrid.GetTileRange(), 0u); // as before
+    oGrid.SetChunkSize(0x80000000u, 0x80000001u);
+    EXPECT_EQ(oGrid.GetTileRange(), 3u);
+    EXPECT_EQ(oGrid.GetTile(3), Tile(0x80000000u, 0x80000001u, 0x7FFFFFFFu, 0x7FFFFFFEu));
+    EXPECT_EQ(oGrid.GetTileIndex(0xFFFFFFFEu, 0xFFFFFFFEu), 3u);
+
+    TileIterator oLine(0x7FFFFFFFu, 1);
+    oLine.SetChunkSize(0, 0);
+    EXPECT_EQ(oLine.GetTileRange(), 0x7FFFFFFEu);
+    EXPECT_EQ(oLine.GetTile(0x7FFFFFFEu), Tile(0x7FFFFFFEu, 0, 1, 1));
+    TileIterator oTooLong(0x80000000u, 1);
+    EXPECT_THROW(oTooLong.SetChunkSize(1, 1), DataException);
+}

@@ -1,0 +1,299 @@
+#include "plugins/support/codec/lzwdecoder.h"
+
+#include "tests/plugins/codec/blocks.h"
+
+#include <gtest/gtest.h>
+
+#include <array>
+
+namespace
+{
+
+using krv::plugins::codec::LzwDecoder;
+using krv::plugins::codec::Result;
+using krv::plugins::codec::Status;
+using krv::test::Bytes;
+using krv::test::Exact;
+
+// Writes codes as TIFF wants them, in either edition.
+class CodeWriter
+{
+public:
+    explicit CodeWriter(bool bOld = false) : mbOld(bOld) {}
+
+    void Put(unsigned int nCode, unsigned int nWidth)
+    {
+        for (unsigned int i = 0; i < nWidth; ++i, ++mnBit)
+        {
+            if (mnBit % 8 == 0)
+                moBytes.push_back(0);
+            const unsigned int nBit = mbOld ? (nCode >> i) & 1 : (nCode >> (nWidth - 1 - i)) & 1;
+            moBytes.back() = static_cast<unsigned char>(moBytes.back() | nBit << (mbOld ? mnBit % 8 : 7 - mnBit % 8));
+        }
+    }
+
+    const Bytes& GetBytes() const { return moBytes; }
+
+private:
+    bool mbOld;
+    std::size_t mnBit = 0;
+    Bytes moBytes;
+};
+
+// The coding as a textbook has it: strings in a list, a search through all of them.
+struct Textbook
+{
+    std::vector<Bytes> moStrings;
+    unsigned int mnWidth = 9;
+    bool mbOld = false;
+
+    void Clear()
+    {
+        moStrings.assign(258, {});
+        for (unsigned int i = 0; i < 256; ++i)
+            moStrings[i] = {static_cast<unsigned char>(i)};
+        mnWidth = 9;
+    }
+
+    void Add(Bytes oString)
+    {
+        if (moStrings.size() < 4096)
+            moStrings.push_back(std::move(oString));
+    }
+
+    // nAhead: how many strings the other side has less.
+    void Grow(std::size_t nAhead)
+    {
+        if (moStrings.size() >= nAhead + (1U << mnWidth) - (mbOld ? 0 : 1) && mnWidth < 12)
+            ++mnWidth;
+    }
+};
+
+struct EncodeOptions
+{
+    bool mbOld = false;
+    bool mbClearFirst = true;
+    bool mbClearWhenFull = true; // otherwise the full table stays in use
+    bool mbEnd = true;
+};
+
+Bytes Encode(const Bytes& oData, const EncodeOptions& oOptions = {})
+{
+    Textbook oBook;
+    oBook.mbOld = oOptions.mbOld;
+    oBook.Clear();
+    CodeWriter oWriter(oOptions.mbOld);
+    if (oOptions.mbClearFirst)
+        oWriter.Put(256, 9);
+    for (std::size_t i = 0; i < oData.size();)
+    {
+        std::size_t nBest = oData[i], nLength = 1;
+        for (std::size_t k = 258; k < oBook.moStrings.size(); ++k)
+        {
+            const Bytes& oString = oBook.moStrings[k];
+            if (oString.size() > nLength && oString.size() <= oData.size() - i &&
+                std::equal(oString.begin(), oString.end(), oData.begin() + static_cast<std::ptrdiff_t>(i)))
+            {
+                nBest = k;
+                nLength = oString.size();
+            }
+        }
+        oWriter.Put(static_cast<unsigned int>(nBest), oBook.mnWidth);
+        const auto oAt = oData.begin() + static_cast<std::ptrdiff_t>(i);
+        i += nLength;
+        if (i < oData.size())
+            oBook.Add(Bytes(oAt, oAt + static_cast<std::ptrdiff_t>(nLength + 1)));
+        oBook.Grow(1);
+        if (oBook.moStrings.size() >= 4095 && oOptions.mbClearWhenFull)
+        {
+            oWriter.Put(256, oBook.mnWidth);
+            oBook.Clear();
+        }
+    }
+    if (oOptions.mbEnd)
+        oWriter.Put(257, oBook.mnWidth);
+    return oWriter.GetBytes();
+}
+
+// The decoding as a textbook has it.
+Result DecodePlainly(const Bytes& oInput, Bytes& oOutput, std::size_t nOutput)
+{
+    Textbook oBook;
+    oBook.mbOld = LzwDecoder::IsOldStyle(oInput.data(), oInput.size());
+    oBook.Clear();
+    Bytes oPrevious;
+    for (std::size_t nBit = 0; oOutput.size() < nOutput; nBit += 0)
+    {
+        if (nBit + oBook.mnWidth > oInput.size() * 8)
+            return {Status::eTruncated, oOutput.size()};
+        unsigned int nCode = 0;
+        for (unsigned int i = 0; i < oBook.mnWidth; ++i, ++nBit)
+            nCode |= oBook.mbOld ? ((oInput[nBit / 8] >> nBit % 8) & 1U) << i
+                                 : ((oInput[nBit / 8] >> (7 - nBit % 8)) & 1U) << (oBook.mnWidth - 1 - i);
+        if (nCode == 257)
+            return {Status::eTruncated, oOutput.size()};
+        if (nCode == 256)
+        {
+            oBook.Clear();
+            oPrevious.clear();
+            continue;
+        }
+        if (oPrevious.empty() ? nCode > 255 : nCode > oBook.moStrings.size())
+            return {Status::eCorrupt, oOutput.size()};
+        if (!oPrevious.empty())
+        {
+            oPrevious.push_back(nCode < oBook.moStrings.size() ? oBook.moStrings[nCode][0] : oPrevious[0]);
+            oBook.Add(oPrevious);
+            oBook.Grow(0);
+        }
+        oPrevious = oBook.moStrings[nCode];
+        oOutput.insert(oOutput.end(), oPrevious.begin(), oPrevious.end());
+    }
+    oOutput.resize(nOutput);
+    return {Status::eDone, nOutput};
+}
+
+// Decodes in memory of exactly the size, and expects what the textbook gives.
+void ExpectAsTextbook(LzwDecoder& oDecoder, const Bytes& oInput, std::size_t nOutput, const std::string& what)
+{
+    Bytes oExpected;
+    const Result oTruth = DecodePlainly(oInput, oExpected, nOutput);
+    Exact oStored(oInput), oOutput(nOutput);
+    const Result oResult = oDecoder.Decode(oStored.data(), oStored.size(), oOutput.data(), oOutput.size());
+    ASSERT_EQ(oTruth.moStatus, oResult.moStatus) << what;
+    ASSERT_EQ(oTruth.mnBytes, oResult.mnBytes) << what;
+    ASSERT_TRUE(oExpected == oOutput.ToBytes(oResult.mnBytes)) << what;
+}
+
+TEST(LzwDecoder, DecodesWhatLibtiffWrites)
+{
+    LzwDecoder oDecoder;
+    for (unsigned int nSeed = 0; nSeed < 60; ++nSeed)
+    {
+        std::mt19937 oRandom(nSeed);
+        const std::size_t nCount = nSeed < 12 ? nSeed + 1 : 1 + oRandom() % 200000;
+        const Bytes oData = krv::test::MakeData(oRandom, nSeed, nCount);
+        krv::test::StripKind oKind;
+        oKind.mnCompression = COMPRESSION_LZW;
+        oKind.mnWidth = static_cast<std::uint32_t>(nCount);
+        Exact oStrip(krv::test::MakeStrip(oData, oKind)), oOutput(nCount);
+        const Result oResult = oDecoder.Decode(oStrip.data(), oStrip.size(), oOutput.data(), oOutput.size());
+        ASSERT_EQ(Status::eDone, oResult.moStatus) << "seed " << nSeed;
+        ASSERT_TRUE(oData == oOutput.ToBytes()) << "seed " << nSeed;
+    }
+}
+
+TEST(LzwDecoder, DecodesEveryLiberty)
+{
+    LzwDecoder oDecoder;
+    const std::array<EncodeOptions, 5> oLiberties{
+        EncodeOptions{}, EncodeOptions{.mbEnd = false}, EncodeOptions{.mbClearFirst = false},
+        EncodeOptions{.mbClearWhenFull = false}, EncodeOptions{.mbOld = true}};
+    for (unsigned int nSeed = 0; nSeed < 6; ++nSeed)
+        for (std::size_t nLiberty = 0; nLiberty < oLiberties.size(); ++nLiberty)
+        {
+            std::mt19937 oRandom(nSeed);
+            const std::string what = "seed " + std::to_string(nSeed) + " liberty " + std::to_string(nLiberty);
+            Bytes oData = krv::test::MakeData(oRandom, nSeed, 6500);
+            oData[0] = 9; // two zeros without a clear code in front would look like the first edition
+            Exact oStored(Encode(oData, oLiberties[nLiberty])), oOutput(oData.size());
+            ASSERT_EQ(oLiberties[nLiberty].mbOld, LzwDecoder::IsOldStyle(oStored.data(), oStored.size())) << what;
+            ASSERT_TRUE(oDecoder.Decode(oStored.data(), oStored.size(), oOutput.data(), oOutput.size()).IsDone())
+                << what;
+            ASSERT_TRUE(oData == oOutput.ToBytes()) << what;
+        }
+}
+
+// Longest strings there can be: every code is the one that is just being made.
+TEST(LzwDecoder, CopiesStringsThatOverlapThemselves)
+{
+    LzwDecoder oDecoder;
+    for (unsigned int nPeriod = 1; nPeriod <= 40; ++nPeriod)
+    {
+        Bytes oData(30000);
+        for (std::size_t i = 0; i < oData.size(); ++i)
+            oData[i] = static_cast<unsigned char>(i % nPeriod * 5);
+        Exact oStored(Encode(oData)), oOutput(oData.size());
+        ASSERT_TRUE(oDecoder.Decode(oStored.data(), oStored.size(), oOutput.data(), oOutput.size()).IsDone());
+        ASSERT_TRUE(oData == oOutput.ToBytes()) << "period " << nPeriod;
+    }
+}
+
+TEST(LzwDecoder, StopsWhereInputOrOutputEnds)
+{
+    LzwDecoder oDecoder;
+    for (unsigned int nSeed = 0; nSeed < 12; ++nSeed)
+    {
+        std::mt19937 oRandom(nSeed);
+        EncodeOptions oOptions;
+        oOptions.mbOld = nSeed >= 6;
+        const Bytes oData = krv::test::MakeData(oRandom, nSeed, 2500);
+        const Bytes oStored = Encode(oData, oOptions);
+        for (std::size_t nCut = 0; nCut < oStored.size(); nCut += 1 + nCut / 40)
+        {
+            const Bytes oPart(oStored.begin(), oStored.begin() + static_cast<std::ptrdiff_t>(nCut));
+            ExpectAsTextbook(oDecoder, oPart, oData.size(),
+                             "seed " + std::to_string(nSeed) + " cut " + std::to_string(nCut));
+        }
+        for (std::size_t nOutput = 0; nOutput <= oData.size() + 40; nOutput += 1 + nOutput / 40)
+            ExpectAsTextbook(oDecoder, oStored, nOutput,
+                             "seed " + std::to_string(nSeed) + " output " + std::to_string(nOutput));
+    }
+}
+
+TEST(LzwDecoder, TakesHostileInputAsTheTextbookDoes)
+{
+    LzwDecoder oDecoder;
+    for (unsigned int nSeed = 0; nSeed < 1500; ++nSeed)
+    {
+        std::mt19937 oRandom(nSeed);
+        EncodeOptions oOptions;
+        oOptions.mbOld = nSeed % 5 == 0;
+        const Bytes oData = krv::test::MakeData(oRandom, nSeed, 1 + oRandom() % 1200);
+        Bytes oInput = nSeed % 3 == 0 ? krv::test::RandomBytes(oRandom, oRandom() % 3000) : Encode(oData, oOptions);
+        for (unsigned int nFlips = oRandom() % 4; nFlips > 0 && !oInput.empty(); --nFlips)
+            oInput[oRandom() % oInput.size()] ^= static_cast<unsigned char>(1U << oRandom() % 8);
+        ExpectAsTextbook(oDecoder, oInput, oRandom() % 4000, "seed " + std::to_string(nSeed));
+    }
+}
+
+// Codes drawn so that nearly all are valid reach states that flipped bits hardly do: full tables, long strings, late
+// clearing.
+TEST(LzwDecoder, TakesAnyOrderOfCodes)
+{
+    LzwDecoder oDecoder;
+    for (unsigned int nSeed = 0; nSeed < 60; ++nSeed)
+    {
+        std::mt19937 oRandom(nSeed);
+        Textbook oBook;
+        CodeWriter oWriter;
+        oBook.Clear();
+        for (unsigned int i = 0; i < 6000; ++i)
+        {
+            const auto nStrings = static_cast<unsigned int>(oBook.moStrings.size());
+            unsigned int nCode = oRandom() % 4 == 0 ? nStrings - oRandom() % 3 : oRandom() % nStrings;
+            nCode = nSeed % 2 == 0 ? std::min(nCode, 4095U) : nCode % 256;
+            if (i % 5000 == 4999)
+                nCode = 256;
+            else if (nCode == 256 || nCode == 257 || oBook.moStrings.size() == 258)
+                nCode = 65;
+            oWriter.Put(nCode, oBook.mnWidth);
+            if (nCode == 256)
+                oBook.Clear();
+            else
+                oBook.Add({});
+            oBook.Grow(1);
+        }
+        ExpectAsTextbook(oDecoder, oWriter.GetBytes(), 200000 + oRandom() % 64, "seed " + std::to_string(nSeed));
+    }
+}
+
+TEST(LzwDecoder, NeedsNothingForEmptyOutput)
+{
+    LzwDecoder oDecoder;
+    EXPECT_TRUE(oDecoder.Decode(nullptr, 0, nullptr, 0).IsDone());
+    unsigned char nByte = 0;
+    EXPECT_EQ(Status::eTruncated, oDecoder.Decode(nullptr, 0, &nByte, 1).moStatus);
+}
+
+} // namespace

@@ -1,0 +1,178 @@
+// Deflate and zstandard keep the same promises about streams that end early, late or never.
+#include "plugins/support/codec/deflatedecoder.h"
+#include "plugins/support/codec/zstddecoder.h"
+#include "tests/plugins/codec/blocks.h"
+
+#include <gtest/gtest.h>
+#include <zlib.h>
+#include <zstd.h>
+
+namespace
+{
+
+using namespace krv::plugins::codec;
+using krv::test::Bytes;
+using krv::test::Exact;
+
+struct Deflate
+{
+    using Decoder = DeflateDecoder;
+
+    static Bytes Encode(const Bytes& oData)
+    {
+        uLongf nSize = compressBound(oData.size());
+        Bytes oStream(nSize);
+        compress2(oStream.data(), &nSize, oData.data(), oData.size(), 6);
+        oStream.resize(nSize);
+        return oStream;
+    }
+};
+
+struct Zstd
+{
+    using Decoder = ZstdDecoder;
+
+    static Bytes Encode(const Bytes& oData)
+    {
+        Bytes oStream(ZSTD_compressBound(oData.size()));
+        ZSTD_CCtx* context = ZSTD_createCCtx();
+        ZSTD_CCtx_setParameter(context, ZSTD_c_checksumFlag, 1);
+        ZSTD_CCtx_setParameter(context, ZSTD_c_contentSizeFlag, oData.size() % 2 == 0 ? 1 : 0);
+        oStream.resize(ZSTD_compress2(context, oStream.data(), oStream.size(), oData.data(), oData.size()));
+        ZSTD_freeCCtx(context);
+        return oStream;
+    }
+};
+
+template <typename Kind>
+class StreamDecoder : public ::testing::Test
+{
+protected:
+    // Decodes in memory of exactly the sizes; what came out goes to moOutput.
+    Result Decode(const Bytes& oStream, std::size_t nOutput)
+    {
+        Exact oInput(oStream), oOutput(nOutput);
+        const Result oResult = moDecoder.Decode(oInput.data(), oInput.size(), oOutput.data(), nOutput);
+        moOutput = oOutput.ToBytes(oResult.mnBytes);
+        return oResult;
+    }
+
+    static Bytes MakeData(unsigned int nSeed)
+    {
+        std::mt19937 oRandom(nSeed);
+        return krv::test::MakeData(oRandom, nSeed, 1 + oRandom() % 60000);
+    }
+
+    typename Kind::Decoder moDecoder;
+    Bytes moOutput;
+};
+
+using Kinds = ::testing::Types<Deflate, Zstd>;
+TYPED_TEST_SUITE(StreamDecoder, Kinds);
+
+TYPED_TEST(StreamDecoder, DecodesWhatTheLibraryWrote)
+{
+    for (unsigned int nSeed = 0; nSeed < 30; ++nSeed)
+    {
+        const Bytes oData = this->MakeData(nSeed);
+        Bytes oStream = TypeParam::Encode(oData);
+        ASSERT_TRUE(this->Decode(oStream, oData.size()).IsDone()) << "seed " << nSeed;
+        ASSERT_TRUE(oData == this->moOutput) << "seed " << nSeed;
+        oStream.insert(oStream.end(), 9, 0xA5);
+        ASSERT_TRUE(this->Decode(oStream, oData.size()).IsDone()) << "seed " << nSeed << ", bytes behind the end";
+        ASSERT_TRUE(oData == this->moOutput) << "seed " << nSeed << ", bytes behind the end";
+    }
+}
+
+TYPED_TEST(StreamDecoder, LongStreamsFillTheOutputAndShortOnesSayHowFarTheyWent)
+{
+    for (unsigned int nSeed = 0; nSeed < 30; ++nSeed)
+    {
+        const Bytes oData = this->MakeData(nSeed);
+        const Bytes oStream = TypeParam::Encode(oData);
+        for (const std::size_t nOutput : {std::size_t{0}, oData.size() / 3, oData.size() - 1})
+        {
+            const Result oLong = this->Decode(oStream, nOutput);
+            ASSERT_EQ(Status::eDone, oLong.moStatus) << "seed " << nSeed << ", " << nOutput;
+            ASSERT_TRUE(Bytes(oData.begin(), oData.begin() + static_cast<std::ptrdiff_t>(nOutput)) == this->moOutput);
+        }
+        const Result oShort = this->Decode(oStream, oData.size() + 7);
+        ASSERT_EQ(Status::eTruncated, oShort.moStatus) << "seed " << nSeed;
+        ASSERT_TRUE(oData == this->moOutput) << "seed " << nSeed;
+    }
+}
+
+TYPED_TEST(StreamDecoder, CutStreamsGiveAPrefix)
+{
+    for (unsigned int nSeed = 0; nSeed < 12; ++nSeed)
+    {
+        const Bytes oData = this->MakeData(nSeed);
+        const Bytes oStream = TypeParam::Encode(oData);
+        for (std::size_t nCut = 0; nCut < oStream.size(); nCut += 1 + oStream.size() / 50)
+        {
+            const Bytes oPart(oStream.begin(), oStream.begin() + static_cast<std::ptrdiff_t>(nCut));
+            const Result oResult = this->Decode(oPart, oData.size());
+            ASSERT_TRUE(oResult.mnBytes == oData.size() || oResult.moStatus == Status::eTruncated)
+                << "seed " << nSeed << ", cut at " << nCut << ", status " << StatusText(oResult.moStatus);
+            ASSERT_TRUE(std::equal(this->moOutput.begin(), this->moOutput.end(), oData.begin()));
+        }
+    }
+}
+
+// Every stream here carries a check sum. A changed one passes only when the change itself makes it longer or takes its
+// check sum away.
+TYPED_TEST(StreamDecoder, ChangedStreamsAreNotTakenForGood)
+{
+    unsigned int nRefused = 0, nWrong = 0;
+    for (unsigned int nSeed = 0; nSeed < 600; ++nSeed)
+    {
+        std::mt19937 oRandom(nSeed);
+        const Bytes oData = krv::test::MakeData(oRandom, nSeed, 1 + oRandom() % 3000);
+        Bytes oStream = TypeParam::Encode(oData);
+        for (unsigned int nFlips = 1 + oRandom() % 3; nFlips > 0; --nFlips)
+            oStream[oRandom() % oStream.size()] ^= static_cast<unsigned char>(1U << oRandom() % 8);
+        const Result oResult = this->Decode(oStream, oData.size());
+        nWrong += oResult.IsDone() && this->moOutput != oData;
+        nRefused += !oResult.IsDone();
+    }
+    EXPECT_GT(nRefused, 500U);
+    EXPECT_LT(nWrong, 12U);
+}
+
+TYPED_TEST(StreamDecoder, NoiseIsRefused)
+{
+    for (unsigned int nSeed = 0; nSeed < 500; ++nSeed)
+    {
+        std::mt19937 oRandom(nSeed);
+        Bytes oStream = krv::test::RandomBytes(oRandom, oRandom() % 300);
+        if (oRandom() % 2 == 0) // something that begins well
+        {
+            const Bytes oGood = TypeParam::Encode(oStream);
+            oStream.insert(oStream.begin(), oGood.begin(), oGood.begin() + 6);
+        }
+        ASSERT_FALSE(this->Decode(oStream, 5000).IsDone()) << "seed " << nSeed;
+    }
+}
+
+TYPED_TEST(StreamDecoder, ADecoderGoesOnAfterAFault)
+{
+    const Bytes oData = this->MakeData(4);
+    const Bytes oStream = TypeParam::Encode(oData);
+    for (int i = 0; i < 3; ++i)
+    {
+        ASSERT_FALSE(this->Decode(Bytes(oStream.begin(), oStream.begin() + 8), oData.size()).IsDone());
+        ASSERT_TRUE(this->Decode(oStream, oData.size()).IsDone());
+        auto oMoved = std::move(this->moDecoder);
+        this->moDecoder = std::move(oMoved);
+        ASSERT_TRUE(oData == this->moOutput);
+    }
+}
+
+TEST(Status, EveryOneHasItsText)
+{
+    for (const Status oStatus : {Status::eDone, Status::eTruncated, Status::eCorrupt, Status::eNoMemory})
+        EXPECT_NE(std::string(), StatusText(oStatus));
+    EXPECT_STRNE(StatusText(Status::eTruncated), StatusText(Status::eCorrupt));
+}
+
+} // namespace

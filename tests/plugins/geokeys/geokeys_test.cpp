@@ -1,0 +1,569 @@
+#include "plugins/tif/geokeys.h"
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/ogc/cs/coordinatetransformation.h"
+#include "toolkit/ogc/cs/crsfactory.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <limits>
+#include <map>
+#include <random>
+#include <sstream>
+
+#include <geotiff.h>
+#include <geovalues.h>
+#include <unistd.h>
+#include <xtiffio.h>
+
+using namespace krv::plugins::tif;
+using namespace krv::ogc::cs;
+using ::testing::HasSubstr;
+
+namespace
+{
+
+struct CloseTiff
+{
+    void operator()(TIFF* poFile) const { TIFFClose(poFile); }
+};
+using TiffFile = std::unique_ptr<TIFF, CloseTiff>;
+
+// Geographic keys as a writer lays them out.
+class Keys
+{
+public:
+    Keys& Code(int nKey, int nValue)
+    {
+        moEntries[nKey] = {0, 1, nValue};
+        return *this;
+    }
+    Keys& Number(int nKey, std::vector<double> oValues)
+    {
+        moEntries[nKey] = {TIFFTAG_GEODOUBLEPARAMS, static_cast<int>(oValues.size()),
+                           static_cast<int>(moDoubles.size())};
+        moDoubles.insert(moDoubles.end(), oValues.begin(), oValues.end());
+        return *this;
+    }
+    Keys& Text(int nKey, const std::string& text)
+    {
+        moEntries[nKey] = {TIFFTAG_GEOASCIIPARAMS, static_cast<int>(text.size() + 1), static_cast<int>(moAscii.size())};
+        moAscii += text + "|";
+        return *this;
+    }
+    Keys& Projected() { return Code(GTModelTypeGeoKey, ModelTypeProjected).Code(ProjectedCSTypeGeoKey, KvUserDefined); }
+
+    std::vector<std::uint16_t> Directory() const
+    {
+        std::vector<std::uint16_t> oDirectory = {1, 1, 0, static_cast<std::uint16_t>(moEntries.size())};
+        for (const auto& [nKey, oEntry] : moEntries)
+        {
+            oDirectory.push_back(static_cast<std::uint16_t>(nKey));
+            for (const int nValue : oEntry)
+                oDirectory.push_back(static_cast<std::uint16_t>(nValue));
+        }
+        return oDirectory;
+    }
+    const std::vector<double>& Doubles() const { return moDoubles; }
+    const std::string& Ascii() const { return moAscii; }
+
+private:
+    std::map<int, std::array<int, 3>> moEntries;
+    std::vector<double> moDoubles;
+    std::string moAscii;
+};
+
+// A directory that is being written answers for its tags like one that was read.
+TiffFile NewTiff()
+{
+    RegisterGeoTags();
+    TIFFSetWarningHandler(nullptr);
+    const auto path = std::filesystem::temp_directory_path() / ("geokeys" + std::to_string(::getpid()) + ".tif");
+    TiffFile poFile(TIFFOpen(path.c_str(), "w"));
+    std::filesystem::remove(path);
+    return poFile;
+}
+
+void SetDoubles(TIFF* poFile, int nTag, const std::vector<double>& oValues)
+{
+    if (!oValues.empty())
+        TIFFSetField(poFile, nTag, static_cast<int>(oValues.size()), oValues.data());
+}
+
+void SetKeys(TIFF* poFile, const std::vector<std::uint16_t>& oDirectory, const std::vector<double>& oDoubles,
+             const std::string& ascii)
+{
+    TIFFSetField(poFile, TIFFTAG_GEOKEYDIRECTORY, static_cast<int>(oDirectory.size()), oDirectory.data());
+    SetDoubles(poFile, TIFFTAG_GEODOUBLEPARAMS, oDoubles);
+    if (!ascii.empty())
+        TIFFSetField(poFile, TIFFTAG_GEOASCIIPARAMS, ascii.c_str());
+}
+
+std::unique_ptr<ICRS> CRSOf(const Keys& oKeys)
+{
+    const TiffFile poFile = NewTiff();
+    SetKeys(poFile.get(), oKeys.Directory(), oKeys.Doubles(), oKeys.Ascii());
+    return ReadCRS(poFile.get());
+}
+
+std::string ErrorOf(const std::vector<std::uint16_t>& oDirectory, const std::vector<double>& oDoubles = {})
+{
+    const TiffFile poFile = NewTiff();
+    SetKeys(poFile.get(), oDirectory, oDoubles, "");
+    try
+    {
+        ReadCRS(poFile.get());
+    }
+    catch (const krv::DataException& oException)
+    {
+        EXPECT_THAT(oException.what(), HasSubstr(TIFFFileName(poFile.get())));
+        return oException.what();
+    }
+    return "no exception";
+}
+
+std::string ErrorOf(const Keys& oKeys)
+{
+    return ErrorOf(oKeys.Directory(), oKeys.Doubles());
+}
+
+std::string DataFolder()
+{
+    const char* poFolder = std::getenv("KRV_TEST_DATA");
+    return poFolder == nullptr ? KRV_TEST_DATA : poFolder;
+}
+
+TiffFile OpenData(const std::string& file)
+{
+    TIFFSetWarningHandler(nullptr);
+    return TiffFile(TIFFOpen((DataFolder() + "/" + file).c_str(), "r"));
+}
+
+std::vector<std::string> Split(const std::string& text, char nSeparator)
+{
+    std::vector<std::string> oParts;
+    std::istringstream oStream(text);
+    for (std::string part; std::getline(oStream, part, nSeparator);)
+        oParts.push_back(part);
+    return oParts;
+}
+
+std::string Kind(const ICRS* poCRS)
+{
+    if (poCRS == nullptr)
+        return "-";
+    if (poCRS->GetEPSG() != 0)
+        return "EPSG:" + std::to_string(poCRS->GetEPSG());
+    return poCRS->IsProjected() ? "projected" : poCRS->IsGeographic() ? "geographic" : "other";
+}
+
+void ExpectTerms(const GeocodingInfo& oInfo, const std::array<double, 6>& oExpected)
+{
+    for (std::size_t nTerm = 0; nTerm < 6; ++nTerm)
+        EXPECT_NEAR(oInfo.GetTerms()[nTerm], oExpected[nTerm], 1e-12 * std::max(1.0, std::abs(oExpected[nTerm])))
+            << nTerm;
+}
+
+} // namespace
+
+TEST(GeoKeysOfRealFiles, AgreeWithTheTableOfFacts)
+{
+    std::ifstream oTable(DataFolder() + "/FACTS.tsv");
+    if (!oTable)
+        GTEST_SKIP() << "no real files at " << DataFolder();
+    std::string line;
+    std::getline(oTable, line);
+    const std::vector<std::string> oColumns = Split(line, '\t');
+    unsigned int nFiles = 0;
+    while (std::getline(oTable, line))
+    {
+        std::map<std::string, std::string> oFacts;
+        const std::vector<std::string> oValues = Split(line, '\t');
+        for (std::size_t nAt = 0; nAt < oValues.size(); ++nAt)
+            oFacts[oColumns[nAt]] = oValues[nAt];
+        SCOPED_TRACE(oFacts["file"]);
+        const TiffFile poFile = OpenData(oFacts["file"]);
+        ASSERT_NE(poFile, nullptr);
+        ++nFiles;
+
+        GeocodingInfo oInfo;
+        EXPECT_EQ(ReadGeocoding(poFile.get(), oInfo), oFacts["geotransform"] != "-");
+        if (oFacts["geotransform"] != "-")
+        {
+            std::array<double, 6> oTerms = {};
+            std::istringstream oText(oFacts["geotransform"]);
+            for (double& nTerm : oTerms)
+                oText >> nTerm;
+            ExpectTerms(oInfo, oTerms);
+        }
+        EXPECT_EQ(ReadTiePoints(poFile.get()).size(), std::strtoul(oFacts["tie_points"].c_str(), nullptr, 10));
+        // Three files say in text what their keys cannot; all of them are projected.
+        const bool bText = oFacts["crs"].starts_with("model:");
+        const std::string expected = oFacts["crs"].starts_with("EPSG") ? oFacts["crs"] : Split(oFacts["crs"], ':')[0];
+        EXPECT_EQ(Kind(ReadCRS(poFile.get()).get()), bText ? "projected" : expected);
+    }
+    EXPECT_EQ(nFiles, 262U);
+}
+
+TEST(GeoKeysOfRealFiles, DefinitionsWithoutCodesAreTheSystemsTheyAreNamedAfter)
+{
+    const std::pair<const char*, int> KNOWN[] = {{"albers_equal_area", 3083},
+                                                 {"equidistant_cylindrical", 4087},
+                                                 {"hotine_oblique_mercator_variant_a", 6808},
+                                                 {"lcc1sp", 5456},
+                                                 {"lcc2sp", 3812},
+                                                 {"new_zealand_mapping_grid", 27200},
+                                                 {"oblique_stereographic", 5588},
+                                                 {"polyconic", 29101},
+                                                 {"transverse_mercator", 3814}};
+    if (!std::filesystem::exists(DataFolder()))
+        GTEST_SKIP() << "no real files at " << DataFolder();
+    for (const auto& [poName, nCode] : KNOWN)
+    {
+        const TiffFile poFile = OpenData(std::string("crs/") + poName + ".tif");
+        const auto poCRS = ReadCRS(poFile.get());
+        EXPECT_EQ(poCRS->GetEPSG(), 0) << poName;
+        EXPECT_TRUE(poCRS->IsEquivalent(*CreateCRSFromEPSG(nCode))) << poName << "\n" << poCRS->GetWKT();
+    }
+    const auto poMercator = ReadCRS(OpenData("nodata/propval_bg_01_01.tif").get());
+    EXPECT_TRUE(poMercator->IsEquivalent(*CreateCRSFromEPSG(3857)));
+    const auto poHeights = ReadCRS(OpenData("crs/test_esri_wkt.tif").get());
+    EXPECT_TRUE(poHeights->HasVertical());
+    EXPECT_THAT(poHeights->GetWKT(), HasSubstr("NAVD88 height"));
+}
+
+TEST(GeoKeys, GeocodingIsForTheOuterCorner)
+{
+    struct Case
+    {
+        std::vector<double> scale, ties, matrix;
+        int rasterType;
+        std::array<double, 6> expected;
+    };
+    const std::vector<double> MATRIX = {3, 1, 0, 500, 1, -2, 0, 900, 0, 0, 0, 0, 0, 0, 0, 1};
+    const Case CASES[] = {{{2, 4, 0}, {0, 0, 0, 100, 200, 0}, {}, 1, {100, 2, 0, 200, 0, -4}},
+                          {{2, 4, 0}, {0, 0, 0, 100, 200, 0}, {}, 2, {99, 2, 0, 202, 0, -4}},
+                          {{2, 4, 0}, {10, 5, 0, 100, 200, 0}, {}, 0, {80, 2, 0, 220, 0, -4}},
+                          {{2, 4, 0}, {0, 0, 0, 1, 1, 0, 9, 9, 0, 9, 9, 0}, {}, 1, {1, 2, 0, 1, 0, -4}},
+                          {{}, {}, MATRIX, 1, {500, 3, 1, 900, 1, -2}},
+                          {{}, {}, MATRIX, 2, {498, 3, 1, 900.5, 1, -2}},
+                          {{2, 4, 0}, {0, 0, 0, 100, 200, 0}, MATRIX, 1, {500, 3, 1, 900, 1, -2}}};
+    for (const Case& oCase : CASES)
+    {
+        const TiffFile poFile = NewTiff();
+        SetDoubles(poFile.get(), TIFFTAG_GEOPIXELSCALE, oCase.scale);
+        SetDoubles(poFile.get(), TIFFTAG_GEOTIEPOINTS, oCase.ties);
+        SetDoubles(poFile.get(), TIFFTAG_GEOTRANSMATRIX, oCase.matrix);
+        SetKeys(poFile.get(), Keys().Code(GTRasterTypeGeoKey, oCase.rasterType).Directory(), {}, "");
+        GeocodingInfo oInfo;
+        ASSERT_TRUE(ReadGeocoding(poFile.get(), oInfo));
+        ExpectTerms(oInfo, oCase.expected);
+        EXPECT_EQ(ReadCRS(poFile.get()), nullptr);
+    }
+}
+
+TEST(GeoKeys, ThereIsNoGeocodingInWhatCannotBeOne)
+{
+    const double nNaN = std::numeric_limits<double>::quiet_NaN();
+    struct Case
+    {
+        std::vector<double> scale, ties, matrix;
+    };
+    const Case CASES[] = {{{}, {}, {}},
+                          {{}, {0, 0, 0, 1, 1, 0}, {}},
+                          {{}, {0, 0, 0, 1, 1, 0, 9, 9, 0, 9, 9, 0}, {}},
+                          {{2, 4, 0}, {}, {}},
+                          {{2, 4, 0}, {0, 0, 0, 1, 1}, {}},
+                          {{0, 4, 0}, {0, 0, 0, 1, 1, 0}, {}},
+                          {{2, nNaN, 0}, {0, 0, 0, 1, 1, 0}, {}},
+                          {{2, 4, 0}, {0, 0, 0, INFINITY, 1, 0}, {}},
+                          {{}, {}, std::vector<double>(16, 0.0)},
+                          {{}, {}, std::vector<double>(12, 1.0)}};
+    for (const Case& oCase : CASES)
+    {
+        const TiffFile poFile = NewTiff();
+        SetDoubles(poFile.get(), TIFFTAG_GEOPIXELSCALE, oCase.scale);
+        SetDoubles(poFile.get(), TIFFTAG_GEOTIEPOINTS, oCase.ties);
+        SetDoubles(poFile.get(), TIFFTAG_GEOTRANSMATRIX, oCase.matrix);
+        GeocodingInfo oInfo(7, 7, 0, 7, 0, 7);
+        EXPECT_FALSE(ReadGeocoding(poFile.get(), oInfo));
+        EXPECT_EQ(oInfo, GeocodingInfo(7, 7, 0, 7, 0, 7));
+    }
+}
+
+TEST(GeoKeys, TiePointsAreGivenFromTheCornerToo)
+{
+    const TiffFile poFile = NewTiff();
+    SetDoubles(poFile.get(), TIFFTAG_GEOTIEPOINTS, {1, 2, 0, 10, 20, 30, 3, 4, 0, NAN, 0, 0, 5, 6, 0, 50, 60, 70, 9});
+    SetKeys(poFile.get(), Keys().Code(GTRasterTypeGeoKey, RasterPixelIsPoint).Directory(), {}, "");
+    const std::vector<TiePoint> oPoints = ReadTiePoints(poFile.get());
+    ASSERT_EQ(oPoints.size(), 2U);
+    EXPECT_EQ(oPoints[0].column, 1.5);
+    EXPECT_EQ(oPoints[0].row, 2.5);
+    EXPECT_EQ(oPoints[1].x, 50.0);
+    EXPECT_EQ(oPoints[1].z, 70.0);
+}
+
+// Every method: the false origin in map coordinates must come out at the origin of the projection on the ground.
+TEST(GeoKeys, EveryProjectionMethodHasItsOriginInTheRightPlace)
+{
+    constexpr int FREE = 1000; // the origin is not where the false coordinates are
+    struct Case
+    {
+        int method;
+        const char* name;
+        double latitude;
+        std::map<int, double> numbers;
+        int latitudeKey = ProjNatOriginLatGeoKey;
+        int longitudeKey = ProjNatOriginLongGeoKey;
+    };
+    const std::map<int, double> PARALLELS = {{ProjStdParallel1GeoKey, 45}, {ProjStdParallel2GeoKey, 55}};
+    const std::map<int, double> AZIMUTHS = {{ProjAzimuthAngleGeoKey, 30}, {ProjRectifiedGridAngleGeoKey, 30}};
+    const std::map<int, double> NO_OFFSET = {{ProjFalseEastingGeoKey, 0}, {ProjFalseNorthingGeoKey, 0}};
+    const std::map<int, double> NEW_ZEALAND = {{ProjFalseEastingGeoKey, 2510000}, {ProjFalseNorthingGeoKey, 6023150}};
+    const Case CASES[] = {
+        {CT_TransverseMercator, "Transverse Mercator", 40, {}},
+        {CT_ObliqueMercator, "Hotine Oblique Mercator (variant A)", FREE, AZIMUTHS, ProjCenterLatGeoKey,
+         ProjCenterLongGeoKey},
+        {CT_HotineObliqueMercatorAzimuthCenter, "Hotine Oblique Mercator (variant B)", 40, AZIMUTHS,
+         ProjCenterLatGeoKey, ProjCenterLongGeoKey},
+        {CT_ObliqueMercator_Laborde,
+         "Laborde Oblique Mercator",
+         -18.9,
+         {{ProjAzimuthAngleGeoKey, 18.9}},
+         ProjCenterLatGeoKey,
+         ProjCenterLongGeoKey},
+        {CT_ObliqueMercator_Rosenmund,
+         "Hotine Oblique Mercator (variant B)",
+         46.9,
+         {},
+         ProjCenterLatGeoKey,
+         ProjCenterLongGeoKey},
+        {CT_Mercator, "Mercator (variant A)", 0, {{ProjScaleAtNatOriginGeoKey, 0.9}}},
+        {CT_Mercator, "Mercator (variant B)", 0, {{ProjStdParallel1GeoKey, 42}}},
+        {CT_LambertConfConic_2SP, "Lambert Conic Conformal (2SP)", 50, PARALLELS, ProjFalseOriginLatGeoKey,
+         ProjFalseOriginLongGeoKey},
+        {CT_LambertConfConic_1SP, "Lambert Conic Conformal (1SP)", 50, {}},
+        {CT_LambertAzimEqualArea, "Lambert Azimuthal Equal Area", 52, {}, ProjCenterLatGeoKey, ProjCenterLongGeoKey},
+        {CT_AlbersEqualArea, "Albers Equal Area", 50, PARALLELS},
+        {CT_AzimuthalEquidistant, "Modified Azimuthal Equidistant", 50, {}},
+        {CT_EquidistantConic, "Equidistant Conic", 50, PARALLELS},
+        {CT_Stereographic, "Stereographic", 50, {}},
+        {CT_PolarStereographic,
+         "Polar Stereographic (variant A)",
+         90,
+         {{ProjScaleAtNatOriginGeoKey, 0.994}},
+         ProjNatOriginLatGeoKey,
+         ProjStraightVertPoleLongGeoKey},
+        {CT_PolarStereographic,
+         "Polar Stereographic (variant B)",
+         -71,
+         {},
+         ProjNatOriginLatGeoKey,
+         ProjStraightVertPoleLongGeoKey},
+        {CT_ObliqueStereographic, "Oblique Stereographic", 50, {}},
+        {CT_Equirectangular,
+         "Equidistant Cylindrical",
+         0,
+         {{ProjStdParallel1GeoKey, 30}},
+         ProjCenterLatGeoKey,
+         ProjCenterLongGeoKey},
+        {CT_CassiniSoldner, "Cassini-Soldner", 10, {}},
+        {CT_Gnomonic, "Gnomonic", 50, {}},
+        {CT_MillerCylindrical, "Miller Cylindrical", 0, {}},
+        {CT_Orthographic, "Orthographic", 50, {}},
+        {CT_Polyconic, "American Polyconic", 30, {}},
+        {CT_Robinson, "Robinson", 0, {}},
+        {CT_Sinusoidal, "Sinusoidal", 0, {}},
+        {CT_VanDerGrinten, "Van Der Grinten", 0, {}},
+        {CT_NewZealandMapGrid, "New Zealand Map Grid", -41, NEW_ZEALAND},
+        {CT_TransvMercator_SouthOriented, "Transverse Mercator (South Orientated)", -20, NO_OFFSET},
+        {CT_CylindricalEqualArea, "Lambert Cylindrical Equal Area", 0, {{ProjStdParallel1GeoKey, 30}}}};
+    for (const Case& oCase : CASES)
+    {
+        SCOPED_TRACE(oCase.name);
+        const double nLongitude = oCase.method == CT_NewZealandMapGrid ? 173.0 : 12.0;
+        Keys oKeys;
+        oKeys.Projected().Code(GeographicTypeGeoKey, 4326).Code(ProjCoordTransGeoKey, oCase.method);
+        oKeys.Number(oCase.latitudeKey, {oCase.latitude == FREE ? 40.0 : oCase.latitude});
+        oKeys.Number(oCase.longitudeKey, {nLongitude});
+        oKeys.Number(ProjFalseEastingGeoKey, {700000.0}).Number(ProjFalseNorthingGeoKey, {300000.0});
+        for (const auto& [nKey, nValue] : oCase.numbers)
+            oKeys.Number(nKey, {nValue});
+        const auto poCRS = CRSOf(oKeys);
+        ASSERT_NE(poCRS, nullptr);
+        EXPECT_EQ(poCRS->GetProjectionMethod(), oCase.name);
+        const auto oEasting = oCase.numbers.find(ProjFalseEastingGeoKey);
+        const auto oNorthing = oCase.numbers.find(ProjFalseNorthingGeoKey);
+        double nX = oEasting == oCase.numbers.end() ? 700000.0 : oEasting->second;
+        double nY = oNorthing == oCase.numbers.end() ? 300000.0 : oNorthing->second;
+        ASSERT_TRUE(CoordinateTransformation(*poCRS, *CreateCRSFromEPSG(4326)).Transform(nX, nY));
+        if (oCase.latitude == FREE)
+            continue;
+        EXPECT_NEAR(nY, oCase.latitude == -71 ? -90.0 : oCase.latitude, 1e-6);
+        if (std::abs(nY) < 89.0)
+        {
+            EXPECT_NEAR(nX, nLongitude, 1e-6);
+        }
+    }
+    EXPECT_THAT(ErrorOf(Keys().Projected().Code(GeographicTypeGeoKey, 4326).Code(ProjCoordTransGeoKey, 6)),
+                HasSubstr("method 6 is not known"));
+    EXPECT_THAT(ErrorOf(Keys().Projected().Code(GeographicTypeGeoKey, 4326)), HasSubstr("name no projection"));
+}
+
+TEST(GeoKeys, DefinitionsFromPartsEqualTheSystemsWithCodes)
+{
+    Keys oPolar;
+    oPolar.Projected().Code(GeographicTypeGeoKey, 4326).Code(ProjCoordTransGeoKey, CT_PolarStereographic);
+    oPolar.Number(ProjNatOriginLatGeoKey, {-71}).Number(ProjStraightVertPoleLongGeoKey, {0});
+    EXPECT_TRUE(CRSOf(oPolar)->IsEquivalent(*CreateCRSFromEPSG(3031)));
+
+    Keys oZone; // a projection with a code, on a system with a code
+    oZone.Projected().Code(GeographicTypeGeoKey, 4326).Code(ProjectionGeoKey, 16032);
+    EXPECT_TRUE(CRSOf(oZone)->IsEquivalent(*CreateCRSFromEPSG(32632)));
+
+    Keys oSouth;
+    oSouth.Projected().Code(GeographicTypeGeoKey, 4148).Code(ProjCoordTransGeoKey, CT_TransvMercator_SouthOriented);
+    oSouth.Number(ProjNatOriginLongGeoKey, {15});
+    EXPECT_TRUE(CRSOf(oSouth)->IsEquivalent(*CreateCRSFromEPSG(2046)));
+
+    Keys oParis; // grads, a meridian of its own, an ellipsoid by its axes
+    oParis.Projected().Code(GeographicTypeGeoKey, KvUserDefined).Code(GeogAngularUnitsGeoKey, 9105);
+    oParis.Text(GeogCitationGeoKey,
+                "GCS Name = NTF (Paris)|Datum = Nouvelle Triangulation Francaise (Paris)|Primem = Paris");
+    oParis.Number(GeogSemiMajorAxisGeoKey, {6378249.2}).Number(GeogSemiMinorAxisGeoKey, {6356515});
+    oParis.Number(GeogPrimeMeridianLongGeoKey, {2.5969213});
+    oParis.Code(ProjCoordTransGeoKey, CT_LambertConfConic_1SP).Number(ProjNatOriginLatGeoKey, {49});
+    oParis.Number(ProjScaleAtNatOriginGeoKey, {0.999877499}).Number(ProjFalseEastingGeoKey, {600000});
+    oParis.Number(ProjFalseNorthingGeoKey, {200000});
+    EXPECT_TRUE(CRSOf(oParis)->IsEquivalent(*CreateCRSFromEPSG(27563))) << CRSOf(oParis)->GetWKT();
+}
+
+TEST(GeoKeys, UnitsEllipsoidsAndShiftsAreTakenAsTheyStand)
+{
+    Keys oKeys;
+    oKeys.Projected().Text(GTCitationGeoKey, "Local \"grid\" \xFF").Text(GeogCitationGeoKey, "Local base");
+    oKeys.Code(GeogEllipsoidGeoKey, 7008).Number(GeogTOWGS84GeoKey, {-8, 160, 176});
+    oKeys.Code(ProjCoordTransGeoKey, CT_TransverseMercator).Code(ProjLinearUnitsGeoKey, KvUserDefined);
+    oKeys.Number(ProjLinearUnitSizeGeoKey, {0.5}).Number(ProjFalseEastingGeoKey, {1000000.1});
+    const auto poCRS = CRSOf(oKeys);
+    EXPECT_EQ(poCRS->GetName(), "Local \"grid\" \xEF\xBF\xBD");
+    EXPECT_EQ(poCRS->GetEllipsoidName(), "Clarke 1866");
+    EXPECT_EQ(poCRS->GetUnitFactor(), 0.5);
+    EXPECT_EQ(poCRS->GetProjectionParameters()[3].value, 1000000.1);
+    EXPECT_THAT(poCRS->GetWKT1(), HasSubstr("TOWGS84[-8,160,176,0,0,0,0]"));
+    EXPECT_THAT(poCRS->GetWKT1(), HasSubstr("GEOGCS[\"Local base\""));
+
+    Keys oSphere;
+    oSphere.Code(GTModelTypeGeoKey, ModelTypeGeographic).Code(GeographicTypeGeoKey, KvUserDefined);
+    oSphere.Code(GeogLinearUnitsGeoKey, 9036).Number(GeogSemiMajorAxisGeoKey, {3396.19});
+    const auto poSphere = CRSOf(oSphere);
+    EXPECT_TRUE(poSphere->IsGeographic());
+    EXPECT_EQ(poSphere->GetSemiMajorAxis(), 3396190.0);
+    EXPECT_EQ(poSphere->GetInverseFlattening(), 0.0);
+
+    EXPECT_EQ(CRSOf(Keys().Code(GTModelTypeGeoKey, ModelTypeProjected).Code(ProjectedCSTypeGeoKey, 54009))->GetName(),
+              "World_Mollweide");
+    EXPECT_EQ(CRSOf(Keys().Code(GTModelTypeGeoKey, ModelTypeGeocentric).Code(GeographicTypeGeoKey, 4978))->GetEPSG(),
+              4978);
+    EXPECT_EQ(CRSOf(Keys().Code(ProjectedCSTypeGeoKey, 32632))->GetEPSG(), 32632); // no model key
+}
+
+TEST(GeoKeys, HeightsMakeACompoundThatKeepsTheCodeOfItsPixels)
+{
+    struct Case
+    {
+        int code;
+        const char* name;
+    };
+    const Case CASES[] = {
+        {5773, "EGM96 height"}, {5703, "NAVD88 height"}, {5103, "North American Vertical Datum 1988"}};
+    for (const Case& oCase : CASES)
+    {
+        Keys oKeys;
+        oKeys.Code(GTModelTypeGeoKey, ModelTypeProjected)
+            .Code(ProjectedCSTypeGeoKey, 32632)
+            .Code(VerticalCSTypeGeoKey, oCase.code);
+        const auto poCRS = CRSOf(oKeys);
+        EXPECT_TRUE(poCRS->HasVertical()) << oCase.code;
+        EXPECT_EQ(poCRS->GetEPSG(), 32632) << oCase.code;
+        EXPECT_THAT(poCRS->GetWKT(), HasSubstr(oCase.name));
+    }
+    Keys oOwn;
+    oOwn.Code(ProjectedCSTypeGeoKey, 32632).Code(VerticalCSTypeGeoKey, KvUserDefined).Code(VerticalUnitsGeoKey, 9002);
+    EXPECT_THAT(CRSOf(oOwn.Text(VerticalCitationGeoKey, "Mine datum"))->GetWKT(), HasSubstr("VERTCRS[\"Mine datum\""));
+    EXPECT_FALSE(CRSOf(Keys().Code(ProjectedCSTypeGeoKey, 32632).Code(VerticalCSTypeGeoKey, 5030))->HasVertical());
+}
+
+TEST(GeoKeys, DamageIsNamedSilently)
+{
+    ::testing::internal::CaptureStderr();
+    EXPECT_THAT(ErrorOf({1, 1}), HasSubstr("too short"));
+    EXPECT_THAT(ErrorOf({2, 1, 0, 0}), HasSubstr("version 2"));
+    EXPECT_THAT(ErrorOf({1, 1, 0, 7, 1024, 0, 1, 1}), HasSubstr("7 keys are announced, 1 found"));
+    EXPECT_THAT(ErrorOf({1, 1, 0, 1, 1024, 0, 3, 1}), HasSubstr("key 1024 has 3 values"));
+    EXPECT_THAT(ErrorOf({1, 1, 0, 1, 3082, 34736, 1, 1}, {1.0}), HasSubstr("key 3082 points outside"));
+    EXPECT_THAT(ErrorOf({1, 1, 0, 1, 3082, 34735, 60000, 60000}), HasSubstr("key 3082 points outside"));
+    EXPECT_EQ(ErrorOf({1, 1, 0, 2, 1024, 0, 1, 2, 1026, 34737, 50, 60000}), ErrorOf(Keys().Code(1024, 2)));
+    EXPECT_THAT(ErrorOf(Keys().Code(ProjectedCSTypeGeoKey, 31)), HasSubstr("EPSG:31 is no known"));
+    EXPECT_THAT(ErrorOf(Keys().Code(ProjectedCSTypeGeoKey, 60000)), HasSubstr("ESRI:60000 is no known"));
+    EXPECT_THAT(ErrorOf(Keys().Code(GTModelTypeGeoKey, 2)), HasSubstr("neither a geographic system nor a datum"));
+    EXPECT_THAT(ErrorOf(Keys().Code(GTModelTypeGeoKey, 2).Number(GeogSemiMajorAxisGeoKey, {-1})),
+                HasSubstr("no possible size"));
+    EXPECT_THAT(ErrorOf(Keys()
+                            .Code(GTModelTypeGeoKey, 2)
+                            .Number(GeogSemiMajorAxisGeoKey, {6e6})
+                            .Code(GeogAngularUnitsGeoKey, 9001)),
+                HasSubstr("no unit of angle"));
+    Keys oNaN;
+    oNaN.Projected()
+        .Code(GeographicTypeGeoKey, 4326)
+        .Code(ProjCoordTransGeoKey, 1)
+        .Number(ProjFalseEastingGeoKey, {NAN});
+    EXPECT_THAT(ErrorOf(oNaN), HasSubstr("\"False easting\" is not finite"));
+    Keys oBoth;
+    oBoth.Projected().Code(GeographicTypeGeoKey, 4326).Code(ProjCoordTransGeoKey, CT_PolarStereographic);
+    oBoth.Number(ProjNatOriginLatGeoKey, {70}).Number(ProjScaleAtNatOriginGeoKey, {0.9});
+    EXPECT_THAT(ErrorOf(oBoth), HasSubstr("both a parallel"));
+    EXPECT_EQ(::testing::internal::GetCapturedStderr(), "");
+}
+
+TEST(GeoKeys, RandomDamageEndsInASystemOrAnException)
+{
+    Keys oKeys;
+    oKeys.Projected().Text(GTCitationGeoKey, "Grid").Text(GeogCitationGeoKey, "GCS Name = a|Datum = b");
+    oKeys.Code(GeographicTypeGeoKey, KvUserDefined)
+        .Number(GeogSemiMajorAxisGeoKey, {6378137})
+        .Number(GeogTOWGS84GeoKey, {1, 2, 3});
+    oKeys.Code(ProjCoordTransGeoKey, 8).Number(ProjStdParallel1GeoKey, {40}).Number(ProjFalseOriginLatGeoKey, {45});
+    oKeys.Code(VerticalCSTypeGeoKey, 5703).Code(ProjLinearUnitsGeoKey, 9003);
+    const unsigned int nSeed = std::random_device()();
+    SCOPED_TRACE(nSeed);
+    std::mt19937 oRandom(nSeed);
+    const int INTERESTING[] = {0, 1, 2, 3, 4, 15, 1024, 4326, 9001, 32767, 32768, 34735, 34736, 34737, 65535};
+    unsigned int nSystems = 0;
+    for (int nRound = 0; nRound < 400; ++nRound)
+    {
+        std::vector<std::uint16_t> oDirectory = oKeys.Directory();
+        std::vector<double> oDoubles = oKeys.Doubles();
+        for (auto nChanges = oRandom() % 3 + 1; nChanges > 0; --nChanges)
+            oDirectory[oRandom() % oDirectory.size()] = static_cast<std::uint16_t>(
+                oRandom() % 2 == 0 ? oRandom() : INTERESTING[oRandom() % std::size(INTERESTING)]);
+        oDoubles[oRandom() % oDoubles.size()] = std::ldexp(1.0, static_cast<int>(oRandom() % 2100) - 1050);
+        const TiffFile poFile = NewTiff();
+        SetKeys(poFile.get(), oDirectory, oDoubles, oKeys.Ascii());
+        try
+        {
+            const auto poCRS = ReadCRS(poFile.get());
+            nSystems += poCRS != nullptr && !poCRS->GetWKT().empty() ? 1 : 0;
+        }
+        catch (const krv::DataException&)
+        {
+        }
+    }
+    EXPECT_GT(nSystems, 0U);
+}

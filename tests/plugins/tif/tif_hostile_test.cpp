@@ -1,0 +1,477 @@
+#include "datasources/metadata/auxiliarydata.h"
+#include "gobs/pct/pct.h"
+#include "tests/plugins/tif/tifsupport.h"
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/ogc/cs/icrs.h"
+
+#include <algorithm>
+#include <chrono>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <random>
+
+#include <gtest/gtest.h>
+#include <sys/resource.h>
+#include <tiffio.h>
+
+namespace
+{
+
+using krv::test::AllChannels;
+using krv::test::OpenTif;
+using krv::test::TemporaryFile;
+using Bytes = std::vector<unsigned char>;
+
+void WriteBytes(const std::string& fileName, const Bytes& oBytes)
+{
+    std::ofstream(fileName, std::ios::binary | std::ios::trunc)
+        .write(reinterpret_cast<const char*>(oBytes.data()), static_cast<std::streamsize>(oBytes.size()));
+}
+
+Bytes ReadBytes(const std::string& fileName)
+{
+    std::ifstream oFile(fileName, std::ios::binary);
+    return Bytes(std::istreambuf_iterator<char>(oFile), {});
+}
+
+// A window of at most 64 x 64 at a corner of the image, of at most four channels.
+void ReadCorner(krv::datasources::IRasterIO& oIO, std::size_t nPixelBytes, bool bLast)
+{
+    const unsigned int nWidth = std::min(64u, oIO.GetFileWidth());
+    const unsigned int nHeight = std::min(64u, oIO.GetFileHeight());
+    Bytes oBuffer(std::size_t{nWidth} * nHeight * nPixelBytes);
+    oIO.ReadWindow(bLast ? oIO.GetFileWidth() - nWidth : 0, bLast ? oIO.GetFileHeight() - nHeight : 0, nWidth, nHeight,
+                   oBuffer.data());
+}
+
+// Asks a file everything. Returns the message of the first exception; anything that is no krv::Exception passes.
+std::string UseFile(const std::string& fileName)
+{
+    std::string first;
+    const auto Try = [&first](auto oStep)
+    {
+        try
+        {
+            oStep();
+        }
+        catch (const krv::Exception& oException)
+        {
+            if (first.empty())
+                first = oException.GetMessage();
+        }
+    };
+    Try(
+        [&]
+        {
+            const OpenTif oFile(fileName);
+            const std::vector<unsigned int> oChannels = AllChannels(std::min(4u, oFile->GetChanCount()));
+            Try(
+                [&]
+                {
+                    const std::unique_ptr<krv::datasources::IRasterIO> poIO(oFile->GetRasterIO(oChannels));
+                    for (bool bLast : {false, true})
+                        Try([&] { ReadCorner(*poIO, oChannels.size() * 16, bLast); });
+                });
+            Try([&] { oFile->ReadAuxiliaryData(); });
+            Try([&] { oFile->GetGeocoding(); });
+            Try([&] { delete oFile->ReadCRS(); });
+            Try(
+                [&]
+                {
+                    const std::unique_ptr<krv::datasources::IOverviewManager> poManager(oFile->GetOverviewManager());
+                    for (unsigned int nLevel : poManager->GetLevels())
+                        Try(
+                            [&]
+                            {
+                                const std::unique_ptr<krv::datasources::IRasterIO> poIO(
+                                    poManager->GetOverviewIO(nLevel, {1}));
+                                ReadCorner(*poIO, 16, true);
+                            });
+                });
+            Try(
+                [&]
+                {
+                    for (unsigned int nBitmap : oFile->GetBitmapList())
+                    {
+                        const std::unique_ptr<krv::datasources::IRasterIO> poIO(oFile->GetBitmapIO({nBitmap}));
+                        ReadCorner(*poIO, 1, true);
+                    }
+                });
+            Try(
+                [&]
+                {
+                    for (unsigned int nTable : oFile->GetPCTList())
+                        delete oFile->GetPCT(nTable);
+                });
+        });
+    return first;
+}
+
+struct Recipe
+{
+    bool tiled;
+    std::uint16_t compression;
+    std::uint16_t bits;
+    std::uint16_t photometric;
+    const char* mode;
+};
+
+// Three channels (or one) of 70 x 50, with a level, a mask and metadata.
+void MakeFile(const std::string& fileName, const Recipe& oRecipe)
+{
+    const std::uint16_t nChannels =
+        oRecipe.photometric == PHOTOMETRIC_RGB || oRecipe.photometric == PHOTOMETRIC_YCBCR ? 3 : 1;
+    TIFF* poTiff = TIFFOpen(fileName.c_str(), oRecipe.mode);
+    ASSERT_NE(poTiff, nullptr);
+    for (unsigned int nPage = 0; nPage < 3; ++nPage)
+    {
+        const unsigned int nWidth = nPage == 1 ? 35 : 70;
+        const unsigned int nHeight = nPage == 1 ? 25 : 50;
+        const bool bMask = nPage == 2;
+        TIFFSetField(poTiff, TIFFTAG_IMAGEWIDTH, nWidth);
+        TIFFSetField(poTiff, TIFFTAG_IMAGELENGTH, nHeight);
+        TIFFSetField(poTiff, TIFFTAG_BITSPERSAMPLE, bMask ? 1 : oRecipe.bits);
+        TIFFSetField(poTiff, TIFFTAG_SAMPLESPERPIXEL, bMask ? 1 : nChannels);
+        TIFFSetField(poTiff, TIFFTAG_PLANARCONFIG, PLANARCONFIG_CONTIG);
+        TIFFSetField(poTiff, TIFFTAG_PHOTOMETRIC, bMask ? PHOTOMETRIC_MASK : oRecipe.photometric);
+        TIFFSetField(poTiff, TIFFTAG_COMPRESSION, bMask ? COMPRESSION_NONE : oRecipe.compression);
+        TIFFSetField(poTiff, TIFFTAG_SUBFILETYPE, nPage == 0 ? 0 : (bMask ? FILETYPE_MASK : FILETYPE_REDUCEDIMAGE));
+        TIFFSetField(poTiff, TIFFTAG_SOFTWARE, "test");
+        if (oRecipe.photometric == PHOTOMETRIC_YCBCR && !bMask)
+            TIFFSetField(poTiff, TIFFTAG_JPEGCOLORMODE, JPEGCOLORMODE_RGB);
+        if (oRecipe.tiled)
+        {
+            TIFFSetField(poTiff, TIFFTAG_TILEWIDTH, 32);
+            TIFFSetField(poTiff, TIFFTAG_TILELENGTH, 32);
+        }
+        else
+            TIFFSetField(poTiff, TIFFTAG_ROWSPERSTRIP, 16);
+        Bytes oBlock(static_cast<std::size_t>(oRecipe.tiled ? TIFFTileSize(poTiff) : TIFFStripSize(poTiff)));
+        for (std::size_t nAt = 0; nAt < oBlock.size(); ++nAt)
+            oBlock[nAt] = static_cast<unsigned char>(nAt * 7 + nAt / 50);
+        const std::uint32_t nBlocks = oRecipe.tiled ? TIFFNumberOfTiles(poTiff) : TIFFNumberOfStrips(poTiff);
+        for (std::uint32_t nBlock = 0; nBlock < nBlocks; ++nBlock)
+        {
+            if (oRecipe.tiled)
+                TIFFWriteEncodedTile(poTiff, nBlock, oBlock.data(), -1);
+            else
+                TIFFWriteEncodedStrip(poTiff, nBlock, oBlock.data(),
+                                      TIFFVStripSize(poTiff, std::min(16u, nHeight - nBlock * 16)));
+        }
+        TIFFWriteDirectory(poTiff);
+    }
+    TIFFClose(poTiff);
+}
+
+constexpr Recipe RECIPES[] = {
+    {true, COMPRESSION_NONE, 8, PHOTOMETRIC_RGB, "w"},
+    {false, COMPRESSION_NONE, 16, PHOTOMETRIC_MINISBLACK, "wb"},
+    {true, COMPRESSION_LZW, 16, PHOTOMETRIC_MINISBLACK, "w8"},
+    {false, COMPRESSION_ADOBE_DEFLATE, 8, PHOTOMETRIC_RGB, "w"},
+    {true, COMPRESSION_ZSTD, 32, PHOTOMETRIC_MINISBLACK, "wb8"},
+    {false, COMPRESSION_PACKBITS, 8, PHOTOMETRIC_RGB, "w"},
+    {true, COMPRESSION_JPEG, 8, PHOTOMETRIC_YCBCR, "w"},
+    {false, COMPRESSION_CCITTFAX4, 1, PHOTOMETRIC_MINISWHITE, "w"},
+    {true, COMPRESSION_LZMA, 8, PHOTOMETRIC_MINISBLACK, "w"},
+    {false, COMPRESSION_LERC, 8, PHOTOMETRIC_MINISBLACK, "w"},
+    {true, COMPRESSION_WEBP, 8, PHOTOMETRIC_RGB, "w"},
+    {false, COMPRESSION_JBIG, 1, PHOTOMETRIC_MINISWHITE, "w"},
+    {false, COMPRESSION_CCITTFAX3, 1, PHOTOMETRIC_MINISBLACK, "wb"},
+};
+
+class TifDamaged : public ::testing::TestWithParam<Recipe>
+{
+};
+
+// Every cut-off leaves a file that is read or refused with a text that names it; nothing else happens.
+TEST_P(TifDamaged, TruncatedFilesAreRefusedByName)
+{
+    const TemporaryFile oName;
+    MakeFile(oName.GetName(), GetParam());
+    EXPECT_EQ(UseFile(oName.GetName()), "");
+    const Bytes oBytes = ReadBytes(oName.GetName());
+    for (std::size_t nSize = 0; nSize + 8 < oBytes.size(); nSize += 1 + nSize / 40)
+    {
+        WriteBytes(oName.GetName(), Bytes(oBytes.begin(), oBytes.begin() + static_cast<std::ptrdiff_t>(nSize)));
+        const std::string message = UseFile(oName.GetName());
+        EXPECT_NE(message.find(oName.GetName()), std::string::npos) << nSize << ": " << message;
+    }
+}
+
+TEST_P(TifDamaged, ChangedBytesNeverDoHarm)
+{
+    const TemporaryFile oName;
+    MakeFile(oName.GetName(), GetParam());
+    const Bytes oSound = ReadBytes(oName.GetName());
+    std::mt19937 oRandom(11);
+    for (int nTry = 0; nTry < 400; ++nTry)
+    {
+        Bytes oBytes = oSound;
+        const unsigned int nChanges = 1 + oRandom() % 6;
+        for (unsigned int nChange = 0; nChange < nChanges; ++nChange)
+        {
+            // Directories stand at the end of what libtiff writes: every other change goes there.
+            const std::size_t nFrom = nChange % 2 == 0 ? 0 : oBytes.size() - std::min<std::size_t>(oBytes.size(), 700);
+            oBytes[nFrom + oRandom() % (oBytes.size() - nFrom)] = static_cast<unsigned char>(
+                oRandom() % 3 == 0 ? oRandom() : std::array<unsigned int, 4>{0, 1, 0x7F, 0xFF}[oRandom() % 4]);
+        }
+        WriteBytes(oName.GetName(), oBytes);
+        const auto oBegin = std::chrono::steady_clock::now();
+        UseFile(oName.GetName());
+        EXPECT_LT(std::chrono::steady_clock::now() - oBegin, std::chrono::seconds(4)) << "try " << nTry;
+    }
+}
+
+std::string RecipeName(const ::testing::TestParamInfo<Recipe>& oInfo)
+{
+    return "Codec" + std::to_string(oInfo.param.compression) + "n" + std::to_string(oInfo.index);
+}
+
+INSTANTIATE_TEST_SUITE_P(Recipes, TifDamaged, ::testing::ValuesIn(RECIPES), RecipeName);
+
+// A little-endian classic file put together entry by entry.
+class Handmade
+{
+public:
+    void Add(std::uint16_t nTag, std::uint16_t nType, std::uint32_t nCount, std::uint32_t nValue)
+    {
+        Put(nTag, 2);
+        Put(nType, 2);
+        Put(nCount, 4);
+        Put(nValue, 4);
+        ++mnEntries;
+    }
+
+    Bytes Finish(std::uint32_t nNext = 0, std::size_t nSize = 0) const
+    {
+        Bytes oFile = {'I', 'I', 42, 0, 8, 0, 0, 0, static_cast<unsigned char>(mnEntries), 0};
+        oFile.insert(oFile.end(), moEntries.begin(), moEntries.end());
+        for (int nByte = 0; nByte < 4; ++nByte)
+            oFile.push_back(static_cast<unsigned char>(nNext >> (8 * nByte)));
+        oFile.resize(std::max(nSize, oFile.size()));
+        return oFile;
+    }
+
+    // One channel of 8 bits in strips.
+    static Handmade Image(std::uint32_t nWidth, std::uint32_t nHeight, std::uint32_t nRowsPerStrip,
+                          std::uint16_t nCompression, std::uint32_t nStrips, std::uint32_t nOffset,
+                          std::uint32_t nBytes, std::uint16_t nBits = 8)
+    {
+        Handmade oFile;
+        oFile.Add(256, 4, 1, nWidth);
+        oFile.Add(257, 4, 1, nHeight);
+        oFile.Add(258, 3, 1, nBits);
+        oFile.Add(259, 3, 1, nCompression);
+        oFile.Add(262, 3, 1, 1);
+        oFile.Add(273, 4, nStrips, nOffset);
+        oFile.Add(277, 3, 1, 1);
+        oFile.Add(278, 4, 1, nRowsPerStrip);
+        oFile.Add(279, 4, nStrips, nBytes);
+        return oFile;
+    }
+
+private:
+    void Put(std::uint32_t nValue, int nBytes)
+    {
+        for (int nByte = 0; nByte < nBytes; ++nByte)
+            moEntries.push_back(static_cast<unsigned char>(nValue >> (8 * nByte)));
+    }
+
+    Bytes moEntries;
+    unsigned int mnEntries = 0;
+};
+
+TEST(TifHostile, HugeClaimsAreRefusedOrServedInBoundedMemory)
+{
+    struct Case
+    {
+        const char* name;
+        Bytes bytes;
+        bool refused;
+    };
+    const Case CASES[] = {
+        {"width 0", Handmade::Image(0, 10, 10, 1, 1, 200, 100).Finish(0, 400), true},
+        {"height beyond signed", Handmade::Image(10, 0x90000000u, 10, 1, 1, 200, 100).Finish(0, 400), true},
+        {"row beyond memory", Handmade::Image(0x7FFFFFFF, 10, 10, 1, 1, 200, 100, 64).Finish(0, 400), true},
+        {"strips without a list", Handmade::Image(1000, 2000000000, 1, 1, 2000000000, 200, 250).Finish(0, 400), true},
+        {"pixels behind the end", Handmade::Image(50000, 50000, 50000, 1, 1, 200, 2500000000u).Finish(0, 400), true},
+        {"tiny data for a huge strip", Handmade::Image(60000, 60000, 60000, 8, 1, 200, 150).Finish(0, 400), true},
+        {"tiny fax for a huge strip", Handmade::Image(60000, 60000, 60000, 4, 1, 200, 150, 1).Finish(0, 400), true},
+        {"strip that claims the file", Handmade::Image(16, 16, 16, 5, 1, 200, 0xFFFFFFFFu).Finish(0, 400), true},
+        {"unstored strips", Handmade::Image(100, 100, 1, 1, 0, 0, 0).Finish(0, 400), true},
+        {"unstored image", Handmade::Image(100000, 100000, 100000, 8, 1, 0, 0).Finish(0, 400), false},
+    };
+    for (const Case& oCase : CASES)
+    {
+        SCOPED_TRACE(oCase.name);
+        const TemporaryFile oName;
+        WriteBytes(oName.GetName(), oCase.bytes);
+        const auto oBegin = std::chrono::steady_clock::now();
+        const std::string message = UseFile(oName.GetName());
+        EXPECT_LT(std::chrono::steady_clock::now() - oBegin, std::chrono::seconds(2));
+        EXPECT_EQ(!message.empty(), oCase.refused) << message;
+        EXPECT_TRUE(!oCase.refused || message.find(oName.GetName()) != std::string::npos) << message;
+    }
+    rusage oUsage{};
+    getrusage(RUSAGE_SELF, &oUsage);
+    EXPECT_LT(oUsage.ru_maxrss, 1024L * 1024); // kilobytes, of all tests in this process and a sanitizer's share
+}
+
+TEST(TifHostile, TagsThatClaimMoreThanMemoryAreRefused)
+{
+    Handmade oFile = Handmade::Image(16, 16, 16, 1, 1, 400, 256);
+    for (std::uint16_t nTag = 60000; nTag < 60010; ++nTag)
+        oFile.Add(nTag, 1, 20000000, 8);
+    const TemporaryFile oName;
+    WriteBytes(oName.GetName(), oFile.Finish(0, 1000));
+    std::filesystem::resize_file(oName.GetName(), 2000000000);
+    EXPECT_NE(UseFile(oName.GetName()).find("the tags claim"), std::string::npos);
+}
+
+TEST(TifHostile, ChainsOfDirectoriesThatNeverEndDoNotHang)
+{
+    const TemporaryFile oName;
+    // A chain into itself.
+    WriteBytes(oName.GetName(), Handmade::Image(16, 16, 16, 1, 1, 400, 256).Finish(8, 1000));
+    EXPECT_NE(UseFile(oName.GetName()).find("circle"), std::string::npos);
+    // Directories of one entry, so many as the file holds.
+    Bytes oBytes = Handmade::Image(16, 16, 16, 1, 1, 400, 256).Finish(1000, 1000);
+    for (std::uint32_t nAt = 0; nAt < 200000; ++nAt)
+    {
+        const std::uint32_t nNext = 1000 + 18 * (nAt + 1);
+        const Bytes oPage = {1,
+                             0,
+                             254,
+                             0,
+                             4,
+                             0,
+                             1,
+                             0,
+                             0,
+                             0,
+                             1,
+                             0,
+                             0,
+                             0,
+                             static_cast<unsigned char>(nNext),
+                             static_cast<unsigned char>(nNext >> 8),
+                             static_cast<unsigned char>(nNext >> 16),
+                             static_cast<unsigned char>(nNext >> 24)};
+        oBytes.insert(oBytes.end(), oPage.begin(), oPage.end());
+    }
+    WriteBytes(oName.GetName(), oBytes);
+    const auto oBegin = std::chrono::steady_clock::now();
+    EXPECT_NE(UseFile(oName.GetName()).find("directories"), std::string::npos);
+    EXPECT_LT(std::chrono::steady_clock::now() - oBegin, std::chrono::seconds(2));
+}
+
+// Bytes of the process now.
+std::size_t ResidentBytes()
+{
+    std::ifstream oFile("/proc/self/statm");
+    std::size_t nTotal = 0;
+    std::size_t nResident = 0;
+    oFile >> nTotal >> nResident;
+    return nResident * 4096;
+}
+
+TEST(TifHostile, SparseGiantOpensAtOnceAndReadsAsZeros)
+{
+    const TemporaryFile oName;
+    TIFF* poTiff = TIFFOpen(oName.GetName().c_str(), "w8");
+    ASSERT_NE(poTiff, nullptr);
+    TIFFSetField(poTiff, TIFFTAG_IMAGEWIDTH, 100000);
+    TIFFSetField(poTiff, TIFFTAG_IMAGELENGTH, 100000);
+    TIFFSetField(poTiff, TIFFTAG_TILEWIDTH, 256);
+    TIFFSetField(poTiff, TIFFTAG_TILELENGTH, 256);
+    TIFFSetField(poTiff, TIFFTAG_BITSPERSAMPLE, 8);
+    TIFFSetField(poTiff, TIFFTAG_SAMPLESPERPIXEL, 1);
+    TIFFSetField(poTiff, TIFFTAG_COMPRESSION, COMPRESSION_ADOBE_DEFLATE);
+    TIFFSetField(poTiff, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
+    Bytes oTile(256 * 256, 7);
+    TIFFWriteEncodedTile(poTiff, 391 * 200 + 200, oTile.data(), 256 * 256);
+    TIFFClose(poTiff);
+
+    const std::size_t nBefore = ResidentBytes();
+    const auto oBegin = std::chrono::steady_clock::now();
+    const OpenTif oFile(oName.GetName());
+    const std::unique_ptr<krv::datasources::IRasterIO> poIO(oFile->GetRasterIO({1}));
+    EXPECT_LT(std::chrono::steady_clock::now() - oBegin, std::chrono::seconds(1));
+    Bytes oBuffer(272 * 272);
+    for (unsigned int nTile = 0; nTile < 1500; ++nTile)
+    {
+        std::fill(oBuffer.begin(), oBuffer.end(), static_cast<unsigned char>(1));
+        poIO->ReadWindow(static_cast<int>(nTile % 391 * 256) - 8, static_cast<int>(nTile / 391 * 256) + 248, 272, 272,
+                         8, 0, 200, 272, oBuffer.data());
+        EXPECT_EQ(oBuffer[8], 0);
+    }
+    poIO->ReadWindow(200u * 256 - 1, 200u * 256, 2u, 1u, oBuffer.data());
+    EXPECT_EQ(oBuffer[0], 0);
+    EXPECT_EQ(oBuffer[1], 7);
+#ifndef KRV_SANITIZED
+    EXPECT_LT(ResidentBytes() - nBefore, std::size_t{110} << 20);
+#else
+    EXPECT_GT(ResidentBytes(), nBefore / 2);
+#endif
+}
+
+TEST(TifHostile, WhatLibtiffGivesAsColoursOnlyIsRefused)
+{
+    struct Case
+    {
+        std::uint16_t photometric, compression, channels;
+    };
+    for (const Case& oCase :
+         {Case{6, 1, 3}, Case{6, 5, 3}, Case{6, 6, 3}, Case{32844, 34676, 1}, Case{32845, 34676, 3}, Case{2, 6, 3}})
+    {
+        Handmade oFile;
+        oFile.Add(256, 4, 1, 16);
+        oFile.Add(257, 4, 1, 16);
+        oFile.Add(258, 3, 1, 8);
+        oFile.Add(259, 3, 1, oCase.compression);
+        oFile.Add(262, 3, 1, oCase.photometric);
+        oFile.Add(273, 4, 1, 300);
+        oFile.Add(277, 3, 1, oCase.channels);
+        oFile.Add(278, 4, 1, 16);
+        oFile.Add(279, 4, 1, 768);
+        const TemporaryFile oName;
+        WriteBytes(oName.GetName(), oFile.Finish(0, 2000));
+        EXPECT_THROW(OpenTif(oName.GetName()), krv::FileFormatException)
+            << oCase.photometric << " " << oCase.compression;
+    }
+}
+
+TEST(TifHostile, OnlyTiffFilesAreClaimed)
+{
+    krv::plugins::tif::TifBuilder oBuilder;
+    const auto Claims = [&oBuilder](Bytes oBytes)
+    {
+        oBytes.resize(4096);
+        return oBuilder.Identify("a.tif", oBytes.data(), 4096, 0) == 0;
+    };
+    EXPECT_TRUE(Claims({'I', 'I', 42, 0, 8, 0, 0, 0}));
+    EXPECT_TRUE(Claims({'M', 'M', 0, 42, 0, 0, 0, 8}));
+    EXPECT_TRUE(Claims({'I', 'I', 43, 0, 8, 0, 0, 0, 16}));
+    EXPECT_TRUE(Claims({'M', 'M', 0, 43, 0, 8, 0, 0, 0, 0, 0, 0, 0, 0, 1, 0}));
+    EXPECT_FALSE(Claims({'I', 'I', 42, 0}));
+    EXPECT_FALSE(Claims({'M', 'M', 42, 0, 8, 0, 0, 0}));
+    EXPECT_FALSE(Claims({'I', 'I', 43, 0, 4, 0, 0, 0, 16}));
+    EXPECT_FALSE(Claims({'I', 'M', 42, 0, 8, 0, 0, 0}));
+    EXPECT_FALSE(Claims({}));
+    EXPECT_THROW(oBuilder.Open("nowhere.tif", eReadOnly), krv::FileNotFoundException);
+    EXPECT_THROW(oBuilder.Open("nowhere.tif", eUpdate), krv::FileNotFoundException);
+}
+
+TEST(TifHostile, FileThatShrinksWhileOpenEndsInAnException)
+{
+    const TemporaryFile oName;
+    MakeFile(oName.GetName(), RECIPES[0]);
+    const OpenTif oFile(oName.GetName());
+    const std::unique_ptr<krv::datasources::IRasterIO> poIO(oFile->GetRasterIO({1, 2, 3}));
+    std::filesystem::resize_file(oName.GetName(), 100);
+    Bytes oBuffer(70 * 50 * 3);
+    EXPECT_THROW(poIO->ReadWindow(0u, 0u, 70u, 50u, oBuffer.data()), krv::FileException);
+}
+
+} // namespace

@@ -1,0 +1,177 @@
+#include "tests/plugins/tifwriting/writingsupport.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <cstring>
+#include <filesystem>
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <tiff.h>
+
+namespace
+{
+
+using namespace krv::test;
+using krv::gobs::DataType;
+
+constexpr krv::gobs::NativeDataTypeCode ALL_TYPES[] = {
+    krv::gobs::eDT_8U,   krv::gobs::eDT_8S,   krv::gobs::eDT_16U,  krv::gobs::eDT_16S,  krv::gobs::eDT_32U,
+    krv::gobs::eDT_32S,  krv::gobs::eDT_32R,  krv::gobs::eDT_64U,  krv::gobs::eDT_64S,  krv::gobs::eDT_64R,
+    krv::gobs::eDT_C16U, krv::gobs::eDT_C16S, krv::gobs::eDT_C32S, krv::gobs::eDT_C32R, krv::gobs::eDT_C64R};
+
+struct Layout
+{
+    const char* mpOptions;
+    bool mbTiled;
+};
+
+TEST(TifCreate, EveryTypeLayoutAndCodecIsReadBackByLibtiffAndHere)
+{
+    constexpr Layout LAYOUTS[] = {{"TILED=YES BLOCKXSIZE=64 BLOCKYSIZE=32", true}, {"TILED=NO BLOCKYSIZE=13", false}};
+    constexpr const char* CODECS[] = {"COMPRESS=NONE",
+                                      "COMPRESS=DEFLATE",
+                                      "COMPRESS=DEFLATE LEVEL=1 PREDICTOR=NO",
+                                      "COMPRESS=LZW",
+                                      "COMPRESS=LZW PREDICTOR=NO",
+                                      "COMPRESS=ZSTD LEVEL=5",
+                                      "COMPRESS=PACKBITS",
+                                      "COMPRESS=LZMA"};
+    const TempFolder oFolder;
+    unsigned int nSeed = 0;
+    for (const auto eType : ALL_TYPES)
+        for (const Layout& oLayout : LAYOUTS)
+            for (const char* pCodec : CODECS)
+                for (const bool bBand : {false, true})
+                {
+                    const unsigned int nChannels = 1 + nSeed % 4;
+                    const std::string options = std::string(oLayout.mpOptions) + " " + pCodec +
+                                                (bBand ? " INTERLEAVE=BAND" : "") +
+                                                (nSeed % 5 == 0 ? " BIGTIFF=YES" : "");
+                    SCOPED_TRACE(DataType(eType).Describe() + " x " + std::to_string(nChannels) + " " + options);
+                    const std::string fileName = oFolder.File("a.tif");
+                    const Bytes oPixels = MakePixels(101, 77, nChannels, eType, ++nSeed);
+                    TifPointer poDataset = CreateTif(fileName, options, 101, 77, nChannels, eType);
+                    WriteAll(*poDataset, oPixels);
+                    ASSERT_EQ(ReadAll(*poDataset), oPixels);
+                    poDataset->Synchronize();
+                    ASSERT_EQ(ReadAll(*poDataset), oPixels);
+                    poDataset->Close();
+
+                    const Judgement oJudgement = Judge(fileName);
+                    ASSERT_EQ(oJudgement.moComplaints, "");
+                    ASSERT_EQ(oJudgement.mbTiled, oLayout.mbTiled);
+                    ASSERT_EQ(oJudgement.mbSeparate, bBand && nChannels > 1);
+                    ASSERT_EQ(oJudgement.mnChannels, nChannels);
+                    ASSERT_TRUE(oJudgement.moPixels == oPixels);
+                    ASSERT_EQ(ReadAll(*OpenTif(fileName)), oPixels);
+                    std::filesystem::remove(fileName);
+                }
+}
+
+TEST(TifCreate, AFileAppearsUnderItsNameOnlyWhenItIsComplete)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("new.tif");
+    TifPointer poDataset = CreateTif(fileName, "COMPRESS=DEFLATE");
+    EXPECT_FALSE(poDataset->Exists());
+    EXPECT_TRUE(ListFolder(oFolder.GetPath()).empty());
+    poDataset->Create(50, 40, {krv::gobs::eDT_8U});
+    EXPECT_TRUE(poDataset->Exists());
+    EXPECT_EQ(poDataset->GetName(), fileName);
+    EXPECT_FALSE(std::filesystem::exists(fileName));
+    EXPECT_EQ(ListFolder(oFolder.GetPath()).size(), 1u);
+    EXPECT_THROW(poDataset->Create(50, 40, {krv::gobs::eDT_8U}), krv::DataException);
+    WriteAll(*poDataset, MakePixels(50, 40, 1, krv::gobs::eDT_8U, 1));
+
+    poDataset.reset();
+    EXPECT_TRUE(ListFolder(oFolder.GetPath()).empty()) << "an unfinished file stayed";
+
+    poDataset = CreateTif(fileName, "", 50, 40, 1, krv::gobs::eDT_8U);
+    poDataset->Synchronize();
+    EXPECT_EQ(ListFolder(oFolder.GetPath()), std::vector<std::string>{"new.tif"});
+    poDataset.reset();
+    EXPECT_EQ(ListFolder(oFolder.GetPath()), std::vector<std::string>{"new.tif"});
+
+    poDataset = CreateTif(oFolder.File("closed.tif"), "", 50, 40, 1, krv::gobs::eDT_8U);
+    poDataset->Close();
+    EXPECT_TRUE(std::filesystem::exists(oFolder.File("closed.tif")));
+}
+
+TEST(TifCreate, AnOldFileStaysWhenItsSuccessorIsNotFinished)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.Write("old.tif", "old");
+    TifPointer poDataset = CreateTif(fileName, "", 20, 20, 1, krv::gobs::eDT_8U);
+    WriteAll(*poDataset, Bytes(400, 7));
+    poDataset.reset();
+    EXPECT_EQ(ReadFile(fileName), "old");
+    poDataset = CreateTif(fileName, "", 20, 20, 1, krv::gobs::eDT_8U);
+    EXPECT_EQ(poDataset->Delete(), krv::datasources::eDone);
+    EXPECT_EQ(ReadFile(fileName), "old");
+    EXPECT_EQ(ListFolder(oFolder.GetPath()).size(), 1u);
+}
+
+TEST(TifCreate, BlocksThatWereNeverWrittenReadAsZeroAndTakeNoRoom)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("sparse.tif");
+    TifPointer poDataset = CreateTif(fileName, "BLOCKXSIZE=256 BLOCKYSIZE=256", 4000, 4000, 1, krv::gobs::eDT_16U);
+    const std::unique_ptr<krv::datasources::IRasterIO> poIO(poDataset->GetRasterIO({1}));
+    Bytes oBlock(256 * 256 * 2, 9);
+    poIO->WriteWindow(512u, 256u, 256, 256, oBlock.data());
+    poDataset->Close();
+    EXPECT_LT(std::filesystem::file_size(fileName), 200000u);
+    const TifPointer poRead = OpenTif(fileName);
+    const Bytes oPixels = ReadAll(*poRead);
+    EXPECT_EQ(std::count(oPixels.begin(), oPixels.end(), 9), 256 * 256 * 2);
+    EXPECT_EQ(oPixels[(256 * 4000 + 512) * 2], 9);
+    // libtiff in update mode hands out the head of the file for such blocks.
+    const TifPointer poUpdated = OpenTif(fileName, eUpdate);
+    EXPECT_EQ(ReadAll(*poUpdated), oPixels);
+}
+
+TEST(TifCreate, OptionsAndTypesThatDoNotGoTogetherAreNamed)
+{
+    const TempFolder oFolder;
+    const auto Message = [&](const std::string& options, const std::vector<DataType>& oTypes)
+    {
+        try
+        {
+            CreateTif(oFolder.File("bad.tif"), options)->Create(10, 10, oTypes);
+        }
+        catch (const krv::DataException& oException)
+        {
+            return oException.GetMessage();
+        }
+        return std::string();
+    };
+    const std::vector<DataType> oBytes = {krv::gobs::eDT_8U};
+    EXPECT_THAT(Message("SPEED=11", oBytes), testing::HasSubstr("SPEED"));
+    EXPECT_THAT(Message("COMPRESS=LZ77", oBytes), testing::HasSubstr("COMPRESS=LZ77"));
+    EXPECT_THAT(Message("TILED", oBytes), testing::HasSubstr("KEY=VALUE"));
+    EXPECT_THAT(Message("BLOCKXSIZE=100", oBytes), testing::HasSubstr("multiples of 16"));
+    EXPECT_THAT(Message("LEVEL=3", oBytes), testing::HasSubstr("LEVEL"));
+    EXPECT_THAT(Message("COMPRESS=ZSTD LEVEL=23", oBytes), testing::HasSubstr("at most 22"));
+    EXPECT_THAT(Message("COMPRESS=ZSTD PREDICTOR=3", oBytes), testing::HasSubstr("8U"));
+    EXPECT_THAT(Message("COMPRESS=JPEG", {krv::gobs::eDT_16U}), testing::HasSubstr("JPEG"));
+    EXPECT_THAT(Message("ALPHA=YES", oBytes), testing::HasSubstr("ALPHA"));
+    const std::string mixed = Message("", {krv::gobs::eDT_8U, krv::gobs::eDT_8U, krv::gobs::eDT_32R});
+    EXPECT_THAT(mixed, testing::HasSubstr("8U"));
+    EXPECT_THAT(mixed, testing::HasSubstr("32R"));
+    EXPECT_NE(Message("", {}), "");
+    EXPECT_NE(Message("", {krv::gobs::DataType(krv::gobs::eDT_BIT)}), "");
+    EXPECT_TRUE(ListFolder(oFolder.GetPath()).empty());
+}
+
+TEST(TifCreate, LargeImagesAreBigTiffInTime)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("large.tif");
+    CreateTif(fileName, "", 40000, 30000, 3, krv::gobs::eDT_8U)->Close();
+    EXPECT_EQ(ReadFile(fileName).substr(0, 3), "II+");
+    CreateTif(fileName, "", 4000, 3000, 3, krv::gobs::eDT_8U)->Close();
+    EXPECT_EQ(ReadFile(fileName).substr(0, 3), "II*");
+    EXPECT_THROW(CreateTif(fileName, "BIGTIFF=NO", 80000, 60000, 3, krv::gobs::eDT_8U), krv::DataException);
+}
+
+} // namespace

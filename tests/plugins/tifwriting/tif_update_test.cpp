@@ -1,0 +1,362 @@
+#include "datasources/interfaces/ioverviewmanager.h"
+#include "datasources/metadata/auxiliarydata.h"
+#include "gobs/raster/rasterinfo.h"
+#include "tests/plugins/tifwriting/writingsupport.h"
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/ogc/cs/crsfactory.h"
+
+#include <chrono>
+#include <csignal>
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
+#include <map>
+#include <thread>
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <sys/resource.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+namespace
+{
+
+using namespace krv::test;
+using krv::datasources::AuxiliaryData;
+using krv::gobs::DataType;
+
+constexpr const char* KINDS[] = {"COMPRESS=NONE BLOCKXSIZE=32 BLOCKYSIZE=32", "COMPRESS=DEFLATE TILED=NO BLOCKYSIZE=7",
+                                 "COMPRESS=LZW BLOCKXSIZE=48 BLOCKYSIZE=16 INTERLEAVE=BAND",
+                                 "COMPRESS=ZSTD BLOCKXSIZE=64 BLOCKYSIZE=64 BIGTIFF=YES"};
+
+TEST(TifUpdate, RandomWindowsOfRandomChannelsEqualAPlainImage)
+{
+    const TempFolder oFolder;
+    for (unsigned int nSeed = 0; nSeed < 12; ++nSeed)
+    {
+        SCOPED_TRACE("seed " + std::to_string(nSeed) + " " + KINDS[nSeed % 4]);
+        const std::string fileName = oFolder.File("w.tif");
+        Bytes oModel(100 * 90 * 3 * 2, 0);
+        std::mt19937 oRandom(nSeed);
+        TifPointer poDataset = CreateTif(fileName, KINDS[nSeed % 4], 100, 90, 3, krv::gobs::eDT_16S);
+        for (unsigned int nStep = 0; nStep < 60; ++nStep)
+        {
+            const std::vector<unsigned int> oChannels =
+                nStep % 3 == 0 ? std::vector<unsigned int>(1, 1 + static_cast<unsigned int>(oRandom() % 3))
+                               : std::vector<unsigned int>{1, 2, 3};
+            const auto nX = static_cast<unsigned int>(oRandom() % 100);
+            const auto nY = static_cast<unsigned int>(oRandom() % 90);
+            const auto nWidth = static_cast<unsigned int>(1 + oRandom() % (100 - nX));
+            const auto nHeight = static_cast<unsigned int>(1 + oRandom() % (90 - nY));
+            Bytes oWindow(std::size_t{nWidth} * nHeight * oChannels.size() * 2);
+            for (unsigned char& nByte : oWindow)
+                nByte = static_cast<unsigned char>(oRandom());
+            for (unsigned int nRow = 0; nRow < nHeight; ++nRow)
+                for (unsigned int nColumn = 0; nColumn < nWidth; ++nColumn)
+                    for (std::size_t nAt = 0; nAt < oChannels.size(); ++nAt)
+                        std::memcpy(&oModel[((nY + nRow) * 100 + nX + nColumn) * 6 + (oChannels[nAt] - 1) * 2],
+                                    &oWindow[((nRow * nWidth + nColumn) * oChannels.size() + nAt) * 2], 2);
+            std::unique_ptr<krv::datasources::IRasterIO> poIO(poDataset->GetRasterIO(oChannels));
+            poIO->WriteWindow(nX, nY, nWidth, nHeight, oWindow.data());
+            if (oRandom() % 8 == 0)
+                poDataset->Synchronize();
+            if (oRandom() % 10 == 0)
+            {
+                poIO.reset();
+                poDataset->Close();
+                poDataset = OpenTif(fileName, eUpdate);
+            }
+            ASSERT_TRUE(ReadAll(*poDataset) == oModel) << "step " << nStep;
+        }
+        poDataset->Close();
+        const Judgement oJudgement = Judge(fileName);
+        EXPECT_EQ(oJudgement.moComplaints, "");
+        EXPECT_TRUE(oJudgement.moPixels == oModel);
+    }
+}
+
+TEST(TifUpdate, WhatIsNotSynchronisedIsNotInTheFile)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("u.tif");
+    for (const char* pKind : KINDS)
+    {
+        const Bytes oFirst = MakePixels(80, 70, 2, krv::gobs::eDT_8U, 1);
+        const Bytes oSecond = MakePixels(80, 70, 2, krv::gobs::eDT_8U, 2);
+        TifPointer poDataset = CreateTif(fileName, pKind, 80, 70, 2, krv::gobs::eDT_8U);
+        WriteAll(*poDataset, oFirst);
+        poDataset->Close();
+        poDataset = OpenTif(fileName, eUpdate);
+        WriteAll(*poDataset, oSecond);
+        EXPECT_TRUE(Judge(fileName).moPixels == oFirst) << pKind;
+        poDataset.reset();
+        EXPECT_TRUE(Judge(fileName).moPixels == oFirst) << pKind;
+        poDataset = OpenTif(fileName, eUpdate);
+        WriteAll(*poDataset, oSecond);
+        poDataset->Synchronize();
+        EXPECT_TRUE(Judge(fileName).moPixels == oSecond) << pKind;
+    }
+}
+
+// A file whose pixels are all one number is rewritten with the next one over and over; a kill leaves one of them whole.
+TEST(TifUpdate, AKilledWriterLeavesTheLastSynchronisedState)
+{
+    const char* pRuns = std::getenv("KRV_KILL_RUNS");
+    const int nRuns = pRuns != nullptr ? std::atoi(pRuns) : 8;
+    std::mt19937 oRandom(20);
+    int nChanged = 0;
+    for (int nRun = 0; nRun < nRuns; ++nRun)
+    {
+        const TempFolder oFolder;
+        const std::string fileName = oFolder.File("k.tif");
+        const char* pKind = KINDS[nRun % 4];
+        SCOPED_TRACE("run " + std::to_string(nRun) + " " + pKind);
+        const bool bNew = nRun % 2 == 1;
+        if (!bNew)
+            CreateTif(fileName, pKind, 300, 200, 1, krv::gobs::eDT_8U)->Close();
+        const pid_t nChild = ::fork();
+        if (nChild == 0)
+        {
+            TifPointer poDataset =
+                bNew ? CreateTif(fileName, pKind, 300, 200, 1, krv::gobs::eDT_8U) : OpenTif(fileName, eUpdate);
+            for (unsigned int nValue = 1;; ++nValue)
+            {
+                WriteAll(*poDataset, Bytes(300 * 200, static_cast<unsigned char>(nValue)));
+                poDataset->Synchronize();
+            }
+        }
+        std::this_thread::sleep_for(std::chrono::microseconds(oRandom() % 60000));
+        ::kill(nChild, SIGKILL);
+        ::waitpid(nChild, nullptr, 0);
+        if (bNew && !std::filesystem::exists(fileName))
+            continue;
+        const Judgement oJudgement = Judge(fileName);
+        ASSERT_EQ(oJudgement.moComplaints, "");
+        ASSERT_EQ(std::count(oJudgement.moPixels.begin(), oJudgement.moPixels.end(), oJudgement.moPixels[0]),
+                  300 * 200);
+        nChanged += oJudgement.moPixels[0] != 0 ? 1 : 0;
+    }
+    EXPECT_GT(nChanged, 0) << "no writer lived long enough";
+}
+
+TEST(TifUpdate, AFullDiskAndAMissingFolderAreReported)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("f/full.tif");
+    std::signal(SIGXFSZ, SIG_IGN);
+    rlimit oOld = {};
+    ::getrlimit(RLIMIT_FSIZE, &oOld);
+    const rlimit oSmall{50000, oOld.rlim_max};
+    {
+        TifPointer poDataset = CreateTif(fileName, "", 400, 400, 1, krv::gobs::eDT_8U);
+        ::setrlimit(RLIMIT_FSIZE, &oSmall);
+        EXPECT_THROW(WriteAll(*poDataset, Bytes(400 * 400, 1)), krv::IOException);
+        ::setrlimit(RLIMIT_FSIZE, &oOld);
+        WriteAll(*poDataset, Bytes(400 * 400, 2));
+        poDataset->Synchronize();
+        EXPECT_EQ(Judge(fileName).moPixels, Bytes(400 * 400, 2));
+        ::setrlimit(RLIMIT_FSIZE, &oSmall);
+        EXPECT_THROW(
+            {
+                WriteAll(*poDataset, Bytes(400 * 400, 3));
+                poDataset->Synchronize();
+            },
+            krv::IOException);
+        ::setrlimit(RLIMIT_FSIZE, &oOld);
+    }
+    EXPECT_EQ(Judge(fileName).moPixels, Bytes(400 * 400, 2));
+    TifPointer poDataset = CreateTif(oFolder.File("gone/a.tif"), "", 40, 40, 1, krv::gobs::eDT_8U);
+    std::filesystem::remove_all(oFolder.GetPath() + "/gone");
+    EXPECT_THROW(poDataset->Synchronize(), krv::IOException);
+    EXPECT_THROW(CreateTif(oFolder.GetPath() + "/none/a.tif", "", 40, 40, 1, krv::gobs::eDT_8U), krv::FileException);
+    EXPECT_THROW(OpenTif(oFolder.Write("text.tif", "no image"), eUpdate), krv::FileException);
+}
+
+TEST(TifUpdate, MetadataComeBackByteForByteAndForeignItemsStay)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("m.tif");
+    TifPointer poDataset = CreateTif(fileName, "ALPHA=YES", 30, 20, 4, krv::gobs::eDT_8U);
+    AuxiliaryData oData = poDataset->ReadAuxiliaryData();
+    const std::map<std::string, std::string> oFile = {{"NO_DATA_VALUE", "-9999.0 "},
+                                                      {"ImageDescription", "a <b> & \"c\""},
+                                                      {"Software", "me"},
+                                                      {"DateTime", "yesterday"},
+                                                      {"XResolution", "300.25"},
+                                                      {"YResolution", "many"},
+                                                      {"ResolutionUnit", "inch"},
+                                                      {"RasterType", "Point"},
+                                                      {"a:b:c", "domain"},
+                                                      {"Quoted \"'<&>\n\t\r", " \n\t\r <&>\"' \xC3\xA4 "},
+                                                      {"Latin", "\xE4\x01\xFF"},
+                                                      {"RPC", "not numbers"}};
+    for (const auto& [key, value] : oFile)
+        oData.SetFileMetadataValue(key, value);
+    oData.SetChanMetadataValue("Scale", "0.1", 2);
+    oData.SetChanMetadataValue("Own", "x", 3);
+    oData.SetChannelDescription("near infrared", 3);
+    oData.SetChanMetadataValue("ColorInterp", "NIR", 3);
+    poDataset->WriteAuxiliaryData(oData);
+    poDataset->Close();
+    const auto Check = [&](const AuxiliaryData& oRead)
+    {
+        for (const auto& [key, value] : oFile)
+            EXPECT_EQ(oRead.GetFileMetadataValue(key), value) << key;
+        for (unsigned int nChannel = 1; nChannel <= 4; ++nChannel)
+        {
+            EXPECT_EQ(oRead.GetChanMetadata(nChannel), oData.GetChanMetadata(nChannel)) << nChannel;
+            EXPECT_EQ(oRead.GetChannelDescription(nChannel), oData.GetChannelDescription(nChannel));
+        }
+    };
+    Check(OpenTif(fileName)->ReadAuxiliaryData());
+    poDataset = OpenTif(fileName, eUpdate);
+    Check(poDataset->ReadAuxiliaryData());
+    oData.RemoveFileMetadataValue("Software");
+    oData.SetChanMetadataValue("Own", "y", 3);
+    poDataset->WriteAuxiliaryData(oData);
+    poDataset->Synchronize();
+    EXPECT_EQ(OpenTif(fileName)->ReadAuxiliaryData().GetFileMetadataValue("Software"), "");
+    EXPECT_EQ(OpenTif(fileName)->ReadAuxiliaryData().GetChanMetadataValue("Own", 3), "y");
+    EXPECT_THROW(poDataset->WriteAuxiliaryData(AuxiliaryData(1)), krv::DataException);
+    EXPECT_EQ(Judge(fileName).moComplaints, "");
+}
+
+TEST(TifUpdate, GeocodingAndReferenceSystemsComeBack)
+{
+    using krv::ogc::cs::GeocodingInfo;
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("g.tif");
+    const auto poUtm = krv::ogc::cs::CreateCRSFromEPSG(32632);
+    const auto poFeet = krv::ogc::cs::CreateCRSFromEPSG(2263);
+    const auto poOwn = krv::ogc::cs::CreateCRSFromWKT(
+        "PROJCS[\"own\",GEOGCS[\"g\",DATUM[\"d\",SPHEROID[\"s\",6378000,298.5]],PRIMEM[\"Greenwich\",0],"
+        "UNIT[\"degree\",0.0174532925199433]],PROJECTION[\"Transverse_Mercator\"],"
+        "PARAMETER[\"latitude_of_origin\",10],PARAMETER[\"central_meridian\",12],PARAMETER[\"scale_factor\",0.99],"
+        "PARAMETER[\"false_easting\",5],PARAMETER[\"false_northing\",6],UNIT[\"metre\",1]]");
+    const GeocodingInfo oPlain(500000.25, 10.5, 0, 5400000.125, 0, -10.25);
+    const GeocodingInfo oTurned(1, 0.5, 0.25, 2, 0.125, -0.5);
+    const auto poWorld = krv::ogc::cs::CreateCRSFromEPSG(4326);
+    for (const auto* poCRS : {poUtm.get(), poFeet.get(), poOwn.get(), poWorld.get()})
+        for (const GeocodingInfo& oInfo : {oPlain, oTurned})
+        {
+            TifPointer poDataset = CreateTif(fileName, "", 30, 20, 1, krv::gobs::eDT_8U);
+            poDataset->SetGeocoding(oInfo);
+            poDataset->UpdateCRS(*poCRS);
+            poDataset->Close();
+            const TifPointer poRead = OpenTif(fileName);
+            EXPECT_TRUE(poRead->GetGeocoding() == oInfo);
+            const std::unique_ptr<krv::ogc::cs::ICRS> poBack(poRead->ReadCRS());
+            ASSERT_TRUE(poBack);
+            EXPECT_TRUE(poBack->IsEquivalent(*poCRS)) << poCRS->GetName();
+            EXPECT_EQ(poBack->GetEPSG(), poCRS->GetEPSG());
+        }
+}
+
+TEST(TifUpdate, LevelsAreMadeWrittenMarkedAndDeleted)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("o.tif");
+    TifPointer poDataset =
+        CreateTif(fileName, "COMPRESS=DEFLATE BLOCKXSIZE=32 BLOCKYSIZE=32", 101, 5, 2, krv::gobs::eDT_16U);
+    std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poDataset->GetOverviewManager());
+    poLevels->SetResamplingName("average");
+    EXPECT_THROW(poLevels->SetResamplingName("best"), krv::ParameterException);
+    const Bytes oPixels = MakePixels(26, 2, 2, krv::gobs::eDT_16U, 3);
+    for (const unsigned int nLevel : {4u, 2u, 64u, 51u})
+        poLevels->CreateLevel(nLevel);
+    EXPECT_THROW(poLevels->CreateLevel(4), krv::DataException);
+    EXPECT_FALSE(poLevels->IsValid(1, 4));
+    {
+        const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(4, {1, 2}));
+        WriteAll(*poIO, 4, oPixels);
+    }
+    poLevels->SetValid(1, 4, true);
+    poLevels->SetValid(2, 4, true);
+    poDataset->WriteAuxiliaryData(AuxiliaryData(2));
+    poDataset->Close();
+
+    poDataset = OpenTif(fileName, eUpdate);
+    poLevels.reset(poDataset->GetOverviewManager());
+    EXPECT_EQ(poLevels->GetLevels(), (std::vector<unsigned int>{2, 4, 51, 64}));
+    EXPECT_EQ(poLevels->GetLevelWidth(4), 26u);
+    EXPECT_EQ(poLevels->GetLevelHeight(4), 2u);
+    EXPECT_TRUE(poLevels->IsValid(2, 4));
+    EXPECT_FALSE(poLevels->IsValid(1, 2));
+    EXPECT_TRUE(Judge(fileName, 1).moPixels == oPixels);
+    WriteAll(*poDataset, MakePixels(101, 5, 2, krv::gobs::eDT_16U, 4));
+    EXPECT_FALSE(poLevels->IsValid(2, 4)) << "the image changed";
+    poLevels->DeleteLevel(51);
+    poDataset->Close();
+    const TifPointer poRead = OpenTif(fileName);
+    poLevels.reset(poRead->GetOverviewManager());
+    EXPECT_EQ(poLevels->GetLevels(), (std::vector<unsigned int>{2, 4, 64}));
+}
+
+TEST(TifUpdate, BitmapsKeepTheirNumbers)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("b.tif");
+    TifPointer poDataset = CreateTif(fileName, "COMPRESS=LZW", 77, 33, 1, krv::gobs::eDT_8U);
+    Bytes oBits(77 * 33);
+    for (std::size_t nAt = 0; nAt < oBits.size(); ++nAt)
+        oBits[nAt] = nAt % 3 == 0 || nAt % 7 == 0;
+    for (unsigned int nBitmap = 1; nBitmap <= 3; ++nBitmap)
+        EXPECT_EQ(poDataset->CreateBitmap(), nBitmap);
+    poDataset->SetBitmapDescription(2, "clouds");
+    poDataset->SetBitmapMetadata(3, {{"Kind", "water"}});
+    {
+        const std::unique_ptr<krv::datasources::IRasterIO> poIO(poDataset->GetBitmapIO({2}));
+        Bytes oAny = oBits;
+        for (unsigned char& nByte : oAny)
+            nByte *= 200;
+        WriteAll(*poIO, 1, oAny);
+    }
+    poDataset->Close();
+    EXPECT_TRUE(Judge(fileName, 2).moPixels == oBits);
+    poDataset = OpenTif(fileName, eUpdate);
+    poDataset->DeleteBitmap(1);
+    poDataset->Close();
+    const TifPointer poRead = OpenTif(fileName);
+    EXPECT_EQ(poRead->GetBitmapList(), (std::vector<unsigned int>{2, 3}));
+    EXPECT_EQ(poRead->GetBitmapDescription(2), "clouds");
+    EXPECT_EQ(poRead->GetBitmapMetadata(3), (krv::datasources::MetadataMap{{"Kind", "water"}}));
+    const std::unique_ptr<krv::datasources::IRasterIO> poIO(poRead->GetBitmapIO({2}));
+    EXPECT_TRUE(ReadAll(*poIO, 1) == oBits);
+}
+
+TEST(TifUpdate, ChannelsAreAddedAndDeleted)
+{
+    const TempFolder oFolder;
+    for (const char* pKind : KINDS)
+    {
+        SCOPED_TRACE(pKind);
+        const std::string fileName = oFolder.File("c.tif");
+        const Bytes oPixels = MakePixels(80, 70, 3, krv::gobs::eDT_16U, 9);
+        TifPointer poDataset = CreateTif(fileName, pKind, 80, 70, 3, krv::gobs::eDT_16U);
+        WriteAll(*poDataset, oPixels);
+        AuxiliaryData oData = poDataset->ReadAuxiliaryData();
+        oData.SetChannelDescription("third", 3);
+        poDataset->WriteAuxiliaryData(oData);
+        poDataset->Synchronize();
+        EXPECT_THROW(poDataset->AddNewChannel(krv::gobs::RasterInfo(80, 70, 1, krv::gobs::eDT_32R)),
+                     krv::DataException);
+        poDataset->AddNewChannel(krv::gobs::RasterInfo(80, 70, 1, krv::gobs::eDT_16U));
+        poDataset->DeleteChannel(2);
+        EXPECT_EQ(Judge(fileName).mnChannels, 3);
+        poDataset->Close();
+        const Judgement oJudgement = Judge(fileName);
+        EXPECT_EQ(oJudgement.moComplaints, "");
+        Bytes oExpected(80 * 70 * 6, 0);
+        for (std::size_t nAt = 0; nAt < 80 * 70; ++nAt)
+        {
+            std::memcpy(&oExpected[nAt * 6], &oPixels[nAt * 6], 2);
+            std::memcpy(&oExpected[nAt * 6 + 2], &oPixels[nAt * 6 + 4], 2);
+        }
+        EXPECT_TRUE(oJudgement.moPixels == oExpected);
+        EXPECT_EQ(OpenTif(fileName)->ReadAuxiliaryData().GetChannelDescription(2), "third");
+        std::filesystem::remove(fileName);
+    }
+}
+
+} // namespace

@@ -1,0 +1,142 @@
+# Reads sources, one after the other, with paths relative to the root of the tree, and prints every include that the
+# structure does not allow: file:line: what is wrong. Fails when there is one.
+# Usage: awk -v root=FOLDER -f layering.awk FILE...
+
+BEGIN {
+    # The order of the layers; includes go to a smaller number or stay in the folder.
+    split("toolkit gobs datasources/api.h datasources/interfaces datasources/metadata datasources/iomanager " \
+          "datasources/reader datasources/writer datasources/maskbuilder datasources/datasets", order, " ");
+    for (n in order)
+        rank[order[n]] = n;
+    rank["datasources/formatregistrar"] = rank["datasources/reader"];
+    rank["datasources/utils"] = rank["datasources/datasets"];
+
+    # The two sources that look up.
+    upward["datasources/iomanager/datasetmanager.cpp", "datasources/formatregistrar"] = 1;
+    upward["datasources/metadata/nodatavalue.cpp", "datasources/reader"] = 1;
+
+    # What a plug-in sees beside its own folder.
+    split("toolkit gobs datasources/api.h datasources/interfaces datasources/metadata plugins/support", names, " ");
+    for (n in names)
+        forPlugins[names[n]] = 1;
+
+    # Libraries of others, and the only folders that may know them.
+    home["^(xercesc|xalanc)/"] = "^(toolkit/xml|datasources/iomanager|datasources/formatregistrar)/";
+    home["^boost/"] = "^datasources/metadata/";
+    home["^(proj\\.h|proj/)"] = "^toolkit/ogc/cs/";
+    home["^(tiff|tiffio|geotiff|geo_|geokeys|geovalues|xtiffio)"] = "^(plugins/tif|tools/samplescene)/";
+    home["^(libdeflate|zstd|zlib)\\.h"] = "^(plugins/support|plugins/tif|tools/krv)/";
+    home["^(fmt|CLI|nlohmann)/|^png\\.h"] = "^tools/";
+    # Their traces in public headers, which everybody who includes them has to have installed.
+    split("toolkit/xml/xmldocument.h toolkit/xml/xmlutil.h datasources/iomanager/xalanselect.h", names, " ");
+    for (n in names)
+        mayShow[names[n]] = 1;
+}
+
+function folder(path,    parts, count)
+{
+    count = split(path, parts, "/");
+    if (parts[1] == "toolkit" || parts[1] == "gobs")
+        return parts[1];
+    return count < 2 ? parts[1] : parts[1] "/" parts[2];
+}
+
+function complain(text)
+{
+    printf "%s:%d: %s\n", FILENAME, FNR, text;
+    bad = 1;
+}
+
+function checkOrder(from, to, target)
+{
+    if (from == to || (FILENAME, to) in upward)
+        return;
+    if (from ~ /^plugins\//) {
+        if (!(to in forPlugins))
+            complain("a plug-in does not include " target);
+        else if (from == "plugins/support" && to ~ /^plugins\//)
+            complain("the base of the plug-ins does not include " target);
+    }
+    else if (from ~ /^tools\//) {
+        if (!(to in rank))
+            complain("a tool does not include " target);
+    }
+    else if (!(to in rank) || rank[to] >= rank[from])
+        complain(from " does not include " target ": includes point downwards only");
+}
+
+function checkOwn(target)
+{
+    checkOrder(folder(FILENAME), folder(target), target);
+    if ((getline unused < (root "/" target)) < 0)
+        complain("no such file from the root: " target);
+    close(root "/" target);
+    if (match(target, /(^|\/)detail\//)) {
+        owner = target ~ /^(toolkit|gobs|datasources)\// ? substr(target, 1, index(target, "/")) : substr(target, 1, RSTART);
+        if (index(FILENAME, owner) != 1)
+            complain(target " is private to " owner);
+        else if (FILENAME ~ /\.h$/ && FILENAME !~ /\/detail\// && FILENAME ~ /^(toolkit|gobs|datasources)\//)
+            complain("a public header does not include the private " target);
+    }
+}
+
+# A source begins with its own header, which so compiles without help.
+function checkFirst(target,    own)
+{
+    own = FILENAME;
+    if (++includes > 1 || !sub(/\.cpp$/, ".h", own) || target == own)
+        return;
+    if ((getline unused < (root "/" own)) >= 0)
+        complain("the first include is not " own);
+    close(root "/" own);
+}
+
+function checkForeign(target,    library)
+{
+    for (library in home) {
+        if (target !~ library)
+            continue;
+        if (FILENAME !~ home[library])
+            complain("<" target "> is not for this folder");
+        else if (FILENAME ~ /\.h$/ && FILENAME !~ /\/detail\// && FILENAME ~ /^(toolkit|gobs|datasources)\// &&
+                 !(FILENAME in mayShow))
+            complain("a public header does not show <" target ">");
+    }
+}
+
+FNR == 1 {
+    includes = 0;
+    ++files;
+}
+
+/^#include "/ {
+    split($0, quoted, "\"");
+    checkFirst(quoted[2]);
+    checkOwn(quoted[2]);
+}
+
+/^#include </ {
+    split($0, pointed, /[<>]/);
+    checkFirst("");
+    checkForeign(pointed[2]);
+}
+
+/^#pragma once/ { once[FILENAME] = 1 }
+
+FILENAME ~ /\.h$/ { headers[FILENAME] = 1 }
+
+END {
+    for (header in headers) {
+        if (!(header in once)) {
+            print header ": no #pragma once";
+            bad = 1;
+        }
+    }
+    if (files < 1) {
+        print "no sources were given";
+        bad = 1;
+    }
+    if (!bad)
+        print files " files keep the layers";
+    exit bad;
+}

@@ -1,0 +1,8 @@
+#!/usr/bin/env bash
+# Who includes whom, for the tree below FOLDER (default: this project).
+set -euo pipefail
+oHere=$(cd "$(dirname "${BASH_SOURCE[0]}")" && pwd)
+cd "${1:-$oHere/../..}"
+
+mapfile -d '' oFiles < <(find toolkit gobs datasources plugins tools -type f \( -name '*.h' -o -name '*.cpp' \) -print0 | sort -z)
+LC_ALL=C awk -v root=. -f "$oHere/layering.awk" "${oFiles[@]}"

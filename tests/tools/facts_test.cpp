@@ -1,0 +1,291 @@
+// Compares what the command says with a table of facts about real files, when the folder with both is there.
+
+#include "datasources/reader/basicreader.h"
+#include "datasources/reader/rasterrange.h"
+#include "tests/tools/programrun.h"
+
+#include <gtest/gtest.h>
+#include <zlib.h>
+
+#include <bit>
+#include <cmath>
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <map>
+#include <sstream>
+
+namespace krv::tool
+{
+
+namespace
+{
+
+using krv::test::RunKrv;
+using nlohmann::json;
+
+std::string DataFolder()
+{
+    const char* const pFolder = std::getenv("KRV_TEST_DATA");
+    return pFolder != nullptr ? pFolder : KRV_TEST_DATA;
+}
+
+std::vector<std::string> Split(const std::string& text, char nSeparator)
+{
+    std::vector<std::string> oParts;
+    std::stringstream oStream(text);
+    for (std::string part; std::getline(oStream, part, nSeparator);)
+        oParts.push_back(part);
+    return oParts;
+}
+
+// One file's row by column name; "-" stands for absent.
+class Facts
+{
+public:
+    Facts(const std::vector<std::string>& oNames, const std::vector<std::string>& oValues)
+    {
+        for (std::size_t i = 0; i < oNames.size(); ++i)
+            moValues[oNames[i]] = i < oValues.size() ? oValues[i] : "-";
+    }
+    const std::string& operator[](const std::string& name) const { return moValues.at(name); }
+    bool Has(const std::string& name) const { return (*this)[name] != "-"; }
+    std::vector<std::string> List(const std::string& name, char nSeparator = ';') const
+    {
+        return Has(name) ? Split((*this)[name], nSeparator) : std::vector<std::string>();
+    }
+    bool IsLossy() const { return (*this)["lossy"] == "yes"; }
+
+private:
+    std::map<std::string, std::string> moValues;
+};
+
+std::vector<Facts> ReadFacts()
+{
+    std::vector<Facts> oRows;
+    std::ifstream oStream(DataFolder() + "/FACTS.tsv");
+    std::string line;
+    std::getline(oStream, line);
+    const auto oNames = Split(line, '\t');
+    while (std::getline(oStream, line))
+        oRows.emplace_back(oNames, Split(line, '\t'));
+    return oRows;
+}
+
+std::string ExpectedType(const std::string& type)
+{
+    static const std::map<std::string, std::string> TYPES{{"uint8", "8U"},          {"int8", "8S"},
+                                                          {"uint16", "16U"},        {"int16", "16S"},
+                                                          {"uint32", "32U"},        {"int32", "32S"},
+                                                          {"uint64", "64U"},        {"int64", "64S"},
+                                                          {"float16", "32R"},       {"float32", "32R"},
+                                                          {"float64", "64R"},       {"cint16", "C16S"},
+                                                          {"uint8(packed)", "8U"},  {"uint16(packed)", "16U"},
+                                                          {"uint32(packed)", "32U"}};
+    return TYPES.at(type);
+}
+
+// IEEE half precision of a value that came from one.
+std::uint16_t ToHalf(float nValue)
+{
+    const auto nBits = std::bit_cast<std::uint32_t>(nValue);
+    const std::uint32_t nSign = nBits >> 16U & 0x8000U, nExponent = nBits >> 23U & 255U, nFraction = nBits & 0x7FFFFFU;
+    if (nExponent == 255)
+        return static_cast<std::uint16_t>(nSign | 0x7C00U | nFraction >> 13U);
+    if (nExponent > 112)
+        return static_cast<std::uint16_t>(nSign | (nExponent - 112) << 10U | nFraction >> 13U);
+    return static_cast<std::uint16_t>(nExponent < 102 ? nSign : nSign | (nFraction | 0x800000U) >> (126 - nExponent));
+}
+
+std::string HalfChecksum(const std::string& file, unsigned int nChannel)
+{
+    krv::datasources::BasicReader oReader(file, {nChannel});
+    oReader.SetTileSize(oReader.GetWidth(), 16);
+    uLong nSum = 0;
+    for (const auto poTile : krv::datasources::RasterRange(oReader))
+    {
+        std::vector<std::uint16_t> oHalves;
+        const auto* const pValues = reinterpret_cast<const float*>(poTile->GetBuffer());
+        for (std::uint64_t i = 0; i < poTile->GetBufferSize() / 4; ++i)
+            oHalves.push_back(ToHalf(pValues[i]));
+        nSum = crc32(nSum, reinterpret_cast<const Bytef*>(oHalves.data()), static_cast<uInt>(2 * oHalves.size()));
+    }
+    std::array<char, 9> aText{};
+    std::snprintf(aText.data(), aText.size(), "%08lx", nSum);
+    return aText.data();
+}
+
+void CompareGeography(const Facts& oFacts, const json& oInfo)
+{
+    const std::string& crs = oFacts["crs"];
+    if (crs.starts_with("EPSG:"))
+    {
+        ASSERT_FALSE(oInfo["crs"].is_null());
+        EXPECT_EQ(oInfo["crs"]["epsg"], json::parse(crs.substr(5)));
+    }
+    else if (crs == "-")
+    {
+        EXPECT_TRUE(oInfo["crs"].is_null());
+    }
+    const auto oTerms = oFacts.List("geotransform", ' ');
+    ASSERT_EQ(oInfo["geocoding"].is_null(), oTerms.empty());
+    for (std::size_t i = 0; i < oTerms.size(); ++i)
+    {
+        const double nTerm = std::stod(oTerms[i]);
+        EXPECT_NEAR(oInfo["geocoding"][i].get<double>(), nTerm, 1e-13 * std::fabs(nTerm) + 1e-15) << "term " << i;
+    }
+}
+
+// The levels that the reduced pages make: the larger page stays where two have one number.
+std::map<unsigned int, std::vector<std::string>> ExpectedLevels(const Facts& oFacts)
+{
+    std::map<unsigned int, std::vector<std::string>> oLevels;
+    for (const std::string& page : oFacts.List("overviews", ' '))
+    {
+        const auto oSize = Split(page.substr(0, page.find(':')), 'x');
+        const double nRatio = std::stod(oFacts["width"]) / std::stod(oSize[0]);
+        const auto nLevel = static_cast<unsigned int>(std::max(std::lround(nRatio), 2L));
+        std::vector<std::string> oPage{oSize[0], oSize[1]};
+        const auto oSums = Split(page.substr(page.find(':') + 1), ';');
+        oPage.insert(oPage.end(), oSums.begin(), oSums.end());
+        const auto oOld = oLevels.find(nLevel);
+        if (oOld == oLevels.end() || std::stoul(oOld->second[0]) < std::stoul(oPage[0]))
+            oLevels[nLevel] = oPage;
+    }
+    return oLevels;
+}
+
+void CompareLevels(const Facts& oFacts, const json& oInfo, const std::string& file)
+{
+    const auto oLevels = ExpectedLevels(oFacts);
+    ASSERT_EQ(oInfo["overviews"].size(), oLevels.size()) << oInfo["overviews"].dump();
+    std::size_t i = 0;
+    for (const auto& [nLevel, oPage] : oLevels)
+    {
+        const json& oFound = oInfo["overviews"][i++];
+        EXPECT_EQ(oFound["level"], nLevel);
+        EXPECT_EQ(oFound["width"].dump() + " " + oFound["height"].dump(), oPage[0] + " " + oPage[1]);
+        if (oFacts.IsLossy() || oFacts["type"] == "float16")
+            continue;
+        const auto oRun = RunKrv({"checksum", file, "--json", "--level", std::to_string(nLevel)});
+        ASSERT_EQ(oRun.code, 0) << oRun.errors;
+        const json oSums = oRun.Json();
+        for (std::size_t c = 0; c < oSums["channels"].size(); ++c)
+            EXPECT_EQ(oSums["channels"][c]["crc32"], oPage.at(2 + c)) << "level " << nLevel << ", channel " << c + 1;
+    }
+}
+
+void CompareInfo(const Facts& oFacts, const std::string& file)
+{
+    const auto oRun = RunKrv({"info", file, "--json"});
+    ASSERT_EQ(oRun.code, 0) << oRun.errors;
+    const json oInfo = oRun.Json();
+    EXPECT_EQ(oInfo["format"], "TIF");
+    EXPECT_EQ(oInfo["width"].dump(), oFacts["width"]);
+    EXPECT_EQ(oInfo["height"].dump(), oFacts["height"]);
+    ASSERT_EQ(std::to_string(oInfo["channels"].size()), oFacts["bands"]);
+    for (const json& oChannel : oInfo["channels"])
+    {
+        EXPECT_EQ(oChannel["type"], ExpectedType(oFacts["type"]));
+        EXPECT_EQ(oChannel["noData"], oFacts.Has("no_data") ? json(oFacts["no_data"]) : json(nullptr));
+    }
+    CompareGeography(oFacts, oInfo);
+    CompareLevels(oFacts, oInfo, file);
+    const std::string full = oFacts["width"] + "x" + oFacts["height"] + "x";
+    std::size_t nMasks = 0;
+    for (const std::string& page : oFacts.List("masks", ' '))
+        nMasks += page.starts_with(full) ? 1 : 0;
+    EXPECT_EQ(oInfo["bitmaps"].size(), nMasks);
+    EXPECT_EQ(oInfo["colourTables"].size(), oFacts.Has("palette") ? 1U : 0U);
+}
+
+void CompareChecksums(const Facts& oFacts, const std::string& file)
+{
+    const auto oRun = RunKrv({"checksum", file, "--json"});
+    ASSERT_EQ(oRun.code, 0) << oRun.errors;
+    const json oSums = oRun.Json();
+    const auto oExpected = oFacts.List("band_crc32");
+    ASSERT_EQ(oSums["channels"].size(), oExpected.size());
+    for (std::size_t c = 0; c < oExpected.size() && !oFacts.IsLossy(); ++c)
+    {
+        const std::string found = oFacts["type"] == "float16" ? HalfChecksum(file, static_cast<unsigned int>(c) + 1)
+                                                              : oSums["channels"][c]["crc32"].get<std::string>();
+        EXPECT_EQ(found, oExpected[c]) << "channel " << c + 1;
+    }
+}
+
+// A value of the table, within the rounding of its digits and the leeway of lossy codecs.
+void ExpectNear(const json& oFound, const std::string& expected, double nLeeway, const char* what)
+{
+    const double nExpected = std::stod(expected);
+    EXPECT_NEAR(oFound.get<double>(), nExpected, std::fabs(nExpected) * 1e-9 + 1e-9 + nLeeway) << what;
+}
+
+void CompareStatistics(const Facts& oFacts, const std::string& file)
+{
+    const auto oRun = RunKrv({"stats", file, "--json"});
+    ASSERT_EQ(oRun.code, 0) << oRun.errors;
+    const json oStatistics = oRun.Json();
+    const double nPixels = std::stod(oFacts["width"]) * std::stod(oFacts["height"]);
+    const auto oNoData = oFacts.List("band_no_data_count"), oNan = oFacts.List("band_nan");
+    for (std::size_t c = 0; c < oStatistics["channels"].size(); ++c)
+    {
+        const json& oChannel = oStatistics["channels"][c];
+        double nCounted = 0;
+        for (const char* pCount : {"valid", "noData", "nan", "infinite"})
+            nCounted += oChannel[pCount].get<double>();
+        EXPECT_EQ(nCounted, nPixels);
+        if (!oNoData.empty() && !oFacts.IsLossy())
+        {
+            EXPECT_EQ(oChannel["noData"].dump(), oNoData.at(c));
+        }
+        if (oFacts["no_data"] != "nan" && oFacts["type"] != "cint16")
+        {
+            EXPECT_EQ(oChannel["nan"].dump(), oNan.at(c));
+        }
+        const bool bSame = oNoData.empty() || oNoData.at(c) == "0"; // the table's figures include no-data
+        if (!bSame || oChannel["of"] == "magnitude" || oChannel["valid"] == 0 || oChannel["infinite"] != 0)
+            continue;
+        ExpectNear(oChannel["min"], oFacts.List("band_min").at(c), oFacts.IsLossy() ? 2 : 0, "minimum");
+        ExpectNear(oChannel["max"], oFacts.List("band_max").at(c), oFacts.IsLossy() ? 2 : 0, "maximum");
+        ExpectNear(oChannel["mean"], oFacts.List("band_mean").at(c), oFacts.IsLossy() ? 0.5 : 0, "mean");
+    }
+}
+
+TEST(RealFiles, AgreeWithTheTableOfFacts)
+{
+    if (!std::filesystem::exists(DataFolder() + "/FACTS.tsv"))
+        GTEST_SKIP() << "no folder of real files";
+    const auto oRows = ReadFacts();
+    ASSERT_FALSE(oRows.empty());
+    for (const Facts& oFacts : oRows)
+    {
+        SCOPED_TRACE(oFacts["file"]);
+        const std::string file = DataFolder() + "/" + oFacts["file"];
+        CompareInfo(oFacts, file);
+        CompareChecksums(oFacts, file);
+        CompareStatistics(oFacts, file);
+    }
+}
+
+TEST(RealFiles, OfOtherKindsAreRefusedWithAReason)
+{
+    if (!std::filesystem::exists(DataFolder() + "/MANIFEST.tsv"))
+        GTEST_SKIP() << "no folder of real files";
+    unsigned int nAsked = 0;
+    for (const auto& oEntry : std::filesystem::directory_iterator(DataFolder() + "/other"))
+    {
+        if (!oEntry.is_regular_file() || oEntry.path().extension() == ".tif")
+            continue;
+        const auto oRun = RunKrv({"info", oEntry.path().string()});
+        ++nAsked;
+        EXPECT_EQ(oRun.code, 1) << oEntry.path();
+        EXPECT_NE(oRun.errors.find("no format recognises this file"), std::string::npos) << oRun.errors;
+    }
+    EXPECT_GT(nAsked, 0U);
+}
+
+} // namespace
+
+} // namespace krv::tool

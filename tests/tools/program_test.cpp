@@ -1,0 +1,292 @@
+// The command as users run it, on files made here.
+
+#include "tests/support/demofile.h"
+#include "tests/support/recipe.h"
+#include "tests/support/tempfolder.h"
+#include "tests/tools/programrun.h"
+
+#include <gtest/gtest.h>
+#include <png.h>
+#include <tiffio.h>
+#include <zlib.h>
+
+#include <algorithm>
+#include <array>
+#include <filesystem>
+
+namespace krv::tool
+{
+
+namespace
+{
+
+using krv::test::ProgramRun;
+using krv::test::RunKrv;
+using krv::test::RunProgram;
+using krv::test::TempFolder;
+using nlohmann::json;
+
+// A sample scene of 300 pixels, made once.
+const std::string& SceneFolder()
+{
+    static const TempFolder oFolder;
+    static const ProgramRun oRun = RunProgram(KRV_SAMPLESCENE_PROGRAM, {oFolder.GetPath(), "--size", "300"});
+    EXPECT_EQ(oRun.code, 0) << oRun.errors;
+    return oFolder.GetPath();
+}
+
+std::string Hexadecimal(unsigned long nNumber)
+{
+    std::array<char, 9> aText{};
+    std::snprintf(aText.data(), aText.size(), "%08lx", nNumber);
+    return aText.data();
+}
+
+// Failed, and said so on one line that holds all the words.
+void ExpectFailure(const ProgramRun& oRun, int nCode, const std::vector<std::string>& oWords)
+{
+    EXPECT_EQ(oRun.code, nCode) << oRun.errors;
+    EXPECT_EQ(std::count(oRun.errors.begin(), oRun.errors.end(), '\n'), 1) << oRun.errors;
+    EXPECT_TRUE(oRun.output.empty()) << oRun.output;
+    for (const std::string& word : oWords)
+        EXPECT_NE(oRun.errors.find(word), std::string::npos) << word << " is not in: " << oRun.errors;
+}
+
+TEST(Command, FormatsListsWhatIsInstalled)
+{
+    const auto oRun = RunKrv({"formats", "--json"});
+    ASSERT_EQ(oRun.code, 0) << oRun.errors;
+    const json oFormats = oRun.Json()["formats"];
+    const auto oTif = std::find_if(oFormats.begin(), oFormats.end(), [](const json& o) { return o["name"] == "TIF"; });
+    ASSERT_NE(oTif, oFormats.end());
+    EXPECT_TRUE((*oTif)["capabilities"]["create"].is_boolean());
+    EXPECT_NE(RunKrv({"formats"}).output.find("TIF"), std::string::npos);
+}
+
+TEST(Command, InfoKeepsItsFieldNames)
+{
+    const auto oRun = RunKrv({"info", SceneFolder() + "/rgb.tif", "--json"});
+    ASSERT_EQ(oRun.code, 0) << oRun.errors;
+    const json oInfo = oRun.Json();
+    for (const char* pName : {"file", "format", "width", "height", "blockWidth", "blockHeight", "channels", "metadata",
+                              "geocoding", "crs", "overviews", "bitmaps", "mathModels"})
+        EXPECT_TRUE(oInfo.contains(pName)) << pName;
+    EXPECT_EQ(oInfo["width"], 300);
+    EXPECT_EQ(oInfo["blockWidth"], 256);
+    EXPECT_EQ(oInfo["geocoding"], json::parse("[288140.0, 10.0, 0.0, 5442360.0, 0.0, -10.0]"));
+    EXPECT_EQ(oInfo["crs"]["epsg"], 32719);
+    EXPECT_EQ(oInfo["crs"]["name"], "WGS 84 / UTM zone 19S");
+    EXPECT_EQ(oInfo["channels"][2]["number"], 3);
+    EXPECT_EQ(oInfo["channels"][2]["type"], "8U");
+    EXPECT_EQ(oInfo["channels"][2]["noData"], "0");
+    EXPECT_EQ(oInfo["channels"][2]["description"], "Blue");
+    EXPECT_EQ(oInfo["overviews"], json::array());
+    const std::string text = RunKrv({"info", SceneFolder() + "/pan.tif"}).output;
+    EXPECT_NE(text.find("EPSG:32719"), std::string::npos) << text;
+    EXPECT_NE(text.find("16U"), std::string::npos) << text;
+}
+
+// Channels of the scene as the TIFF library alone decodes them, pixel-interleaved.
+std::string DecodeTiles(const std::string& file, std::size_t nPixelBytes)
+{
+    TIFF* const poTiff = TIFFOpen(file.c_str(), "rm");
+    std::string pixels(300 * 300 * nPixelBytes, '\0'), tile(256 * 256 * nPixelBytes, '\0');
+    for (unsigned int i = 0; i < 4; ++i)
+    {
+        TIFFReadEncodedTile(poTiff, i, tile.data(), static_cast<tmsize_t>(tile.size()));
+        const unsigned int nX = i % 2 * 256, nY = i / 2 * 256;
+        for (unsigned int y = nY; y < std::min(nY + 256, 300U); ++y)
+            tile.copy(pixels.data() + (y * 300 + nX) * nPixelBytes, std::min(256U, 300 - nX) * nPixelBytes,
+                      (y - nY) * 256 * nPixelBytes);
+    }
+    TIFFClose(poTiff);
+    return pixels;
+}
+
+TEST(Command, ChecksumAndStatsAgreeWithTheTiffLibrary)
+{
+    TIFFSetWarningHandler(nullptr);
+    const std::string pixels = DecodeTiles(SceneFolder() + "/rgb.tif", 3);
+    std::string green;
+    for (std::size_t i = 1; i < pixels.size(); i += 3)
+        green += pixels[i];
+    const auto oRun = RunKrv({"checksum", SceneFolder() + "/rgb.tif", "--channels", "3,2", "--json"});
+    ASSERT_EQ(oRun.code, 0) << oRun.errors;
+    EXPECT_EQ(oRun.Json()["channels"][1]["number"], 2);
+    EXPECT_EQ(oRun.Json()["channels"][1]["crc32"],
+              Hexadecimal(crc32(0, reinterpret_cast<const Bytef*>(green.data()), static_cast<uInt>(green.size()))));
+
+    const json oStatistics = RunKrv({"stats", SceneFolder() + "/rgb.tif", "--json"}).Json()["channels"][1];
+    EXPECT_EQ(oStatistics["noData"], std::count(green.begin(), green.end(), '\0'));
+    EXPECT_GT(oStatistics["noData"], 1000);
+    EXPECT_EQ(oStatistics["valid"].get<int>() + oStatistics["noData"].get<int>(), 90000);
+    const auto* const pHighest = std::max_element(reinterpret_cast<const unsigned char*>(green.data()),
+                                                  reinterpret_cast<const unsigned char*>(green.data()) + green.size());
+    EXPECT_EQ(oStatistics["max"], *pHighest);
+}
+
+TEST(Command, MixedTypesKeepTheOrderOfTheChannels)
+{
+    const TempFolder oFolder;
+    const std::string file = oFolder.File("mixed.demo");
+    const std::vector<krv::gobs::DataType> oTypes{krv::gobs::eDT_8U, krv::gobs::eDT_64R, krv::gobs::eDT_8U,
+                                                  krv::gobs::eDT_C16S};
+    krv::test::WriteDemoFile(file, 40, 30, oTypes);
+    const auto oRun = RunKrv({"checksum", file, "--json"});
+    ASSERT_EQ(oRun.code, 0) << oRun.errors;
+    for (unsigned int c = 1; c <= oTypes.size(); ++c)
+    {
+        const std::string bytes = krv::test::RecipeImage(40, 30, {c}, oTypes[c - 1]);
+        const json oChannel = oRun.Json()["channels"][c - 1];
+        EXPECT_EQ(oChannel["number"], c);
+        EXPECT_EQ(oChannel["type"], oTypes[c - 1].Describe());
+        EXPECT_EQ(oChannel["crc32"],
+                  Hexadecimal(crc32(0, reinterpret_cast<const Bytef*>(bytes.data()), static_cast<uInt>(bytes.size()))));
+    }
+    EXPECT_EQ(RunKrv({"stats", file, "--json"}).Json()["channels"][3]["of"], "magnitude");
+    EXPECT_EQ(RunKrv({"walk", file, "--margins", "3", "--json"}).code, 0);
+    EXPECT_EQ(RunKrv({"view", file, oFolder.File("mixed.png")}).code, 0);
+}
+
+TEST(Command, WalkDeliversEveryTileWithItsMargins)
+{
+    const auto oRun = RunKrv({"walk", SceneFolder() + "/rgb.tif", "--tile", "100,150", "--margins", "8,4",
+                              "--behaviour", "replicate", "--json"});
+    ASSERT_EQ(oRun.code, 0) << oRun.errors;
+    EXPECT_EQ(oRun.Json()["tiles"], 6);
+    EXPECT_EQ(oRun.Json()["pixels"], 6 * 116 * 158);
+    EXPECT_EQ(oRun.Json()["bytes"], 6 * 116 * 158 * 3);
+    ExpectFailure(RunKrv({"walk", SceneFolder() + "/rgb.tif", "--margins", "8", "--behaviour", "exception"}), 1,
+                  {"rgb.tif", "Margin behaviour is eException"});
+}
+
+png_image ReadPng(const std::string& file, std::vector<unsigned char>& oPixels)
+{
+    png_image oImage{};
+    oImage.version = PNG_IMAGE_VERSION;
+    EXPECT_NE(png_image_begin_read_from_file(&oImage, file.c_str()), 0) << oImage.message;
+    oImage.format = PNG_FORMAT_RGBA;
+    oPixels.resize(PNG_IMAGE_SIZE(oImage));
+    EXPECT_NE(png_image_finish_read(&oImage, nullptr, oPixels.data(), 0, nullptr), 0) << oImage.message;
+    return oImage;
+}
+
+TEST(Command, ViewMakesMissingPixelsTransparent)
+{
+    const TempFolder oFolder;
+    const std::string target = oFolder.File("look.png");
+    const auto oRun = RunKrv({"view", SceneFolder() + "/rgb.tif", target, "--size", "100"});
+    ASSERT_EQ(oRun.code, 0) << oRun.errors;
+    std::vector<unsigned char> oPixels;
+    const png_image oImage = ReadPng(target, oPixels);
+    ASSERT_EQ(oImage.width, 100U);
+    ASSERT_EQ(oImage.height, 100U);
+    EXPECT_EQ(oPixels[3], 0);
+    EXPECT_EQ(oPixels[(50 * 100 + 50) * 4 + 3], 255);
+    ASSERT_EQ(RunKrv({"view", SceneFolder() + "/pan.tif", target, "--size", "5000"}).code, 0);
+    EXPECT_EQ(ReadPng(target, oPixels).width, 300U);
+    ExpectFailure(RunKrv({"view", SceneFolder() + "/pan.tif", oFolder.GetPath() + "/no/look.png"}), 1,
+                  {"no/look.png", "No such file"});
+    ExpectFailure(RunKrv({"view", SceneFolder() + "/rgb.tif", target, "--channels", "1,2"}), 2, {"three"});
+    EXPECT_EQ(std::distance(std::filesystem::directory_iterator(oFolder.GetPath()), {}), 1);
+}
+
+TEST(Command, WrongUsageIsTwo)
+{
+    EXPECT_EQ(RunKrv({}).code, 2);
+    EXPECT_EQ(RunKrv({"explode"}).code, 2);
+    EXPECT_EQ(RunKrv({"info"}).code, 2);
+    EXPECT_EQ(RunKrv({"info", "a", "--nonsense"}).code, 2);
+    EXPECT_EQ(RunKrv({"view", "a", "b", "--size", "0"}).code, 2);
+    EXPECT_EQ(RunKrv({"--help"}).code, 0);
+    EXPECT_EQ(RunKrv({"--version"}).code, 0);
+    const std::string scene = SceneFolder() + "/rgb.tif";
+    ExpectFailure(RunKrv({"checksum", scene, "--channels", "4"}), 2, {"rgb.tif", "no channel 4", "1 to 3"});
+    ExpectFailure(RunKrv({"checksum", scene, "--channels", "1;2"}), 2, {"--channels"});
+    ExpectFailure(RunKrv({"checksum", scene, "--level", "2"}), 2, {"rgb.tif", "no level 2"});
+}
+
+TEST(Command, ErrorsNameFileCauseAndRemedy)
+{
+    const TempFolder oFolder;
+    const std::string text = oFolder.Write("notes.txt", "hello");
+    const std::string scene = krv::test::ReadFile(SceneFolder() + "/rgb.tif");
+    const std::string cut = oFolder.Write("cut.tif", scene.substr(0, scene.size() / 2));
+    ExpectFailure(RunKrv({"info", oFolder.File("none.tif")}), 1, {"none.tif", "no such file", "check"});
+    ExpectFailure(RunKrv({"stats", oFolder.GetPath()}), 1, {oFolder.GetPath(), "folder"});
+    ExpectFailure(RunKrv({"info", text}), 1, {"notes.txt", "no format recognises", "krv doctor"});
+    ExpectFailure(RunKrv({"checksum", cut}), 1, {"cut.tif"});
+    ExpectFailure(RunKrv({"info", oFolder.File("none.tif"), "--verbose"}), 1, {"["});
+    const auto oDoctor = RunKrv({"doctor", text});
+    EXPECT_EQ(oDoctor.code, 1);
+    EXPECT_NE(oDoctor.output.find("no format recognises it"), std::string::npos) << oDoctor.output;
+    EXPECT_EQ(RunKrv({"doctor", SceneFolder() + "/rgb.tif"}).code, 0);
+}
+
+TEST(Command, BrokenInstallationsAreDiagnosed)
+{
+    const TempFolder oHome;
+    const std::vector<std::string> oEnvironment{"KRVHOME=" + oHome.GetPath()};
+    const auto Expect = [&](const std::vector<std::string>& oErrorWords, const std::string& doctorWord)
+    {
+        ExpectFailure(RunKrv({"formats"}, oEnvironment), 1, oErrorWords);
+        const auto oDoctor = RunKrv({"doctor"}, oEnvironment);
+        EXPECT_EQ(oDoctor.code, 1);
+        EXPECT_TRUE(oDoctor.errors.empty()) << oDoctor.errors;
+        EXPECT_NE(oDoctor.output.find(doctorWord), std::string::npos) << oDoctor.output;
+    };
+    Expect({"availableformats.xml", "KRVHOME"}, "no such file");
+    oHome.Write("etc/qrfformats/availableformats.xml", "<Formats><Format>x.xml");
+    Expect({"availableformats.xml", "reinstall"}, "mend the XML");
+    oHome.Write("etc/qrfformats/availableformats.xml", "<Formats/>");
+    Expect({"availableformats.xml", "lists no format"}, "lists no format");
+    oHome.Write("etc/qrfformats/availableformats.xml", "<Formats><Format> x.xml </Format></Formats>");
+    Expect({"x.xml"}, "description x.xml");
+    oHome.Write("etc/qrfformats/x.xml", "<Format><Object>nowhere</Object></Format>");
+    Expect({"nowhere.so", "registry"}, "plug-in nowhere.so: does not load");
+    oHome.Write("lib/qrfformats/nowhere.so", "no library at all");
+    Expect({"nowhere.so"}, "plug-in nowhere.so: does not load");
+}
+
+// A tiled file of zeros; its blocks but the first are not stored.
+void WriteSparse(const std::string& file, unsigned int nSize, const char* pDescription)
+{
+    TIFF* const poTiff = TIFFOpen(file.c_str(), "w8");
+    TIFFSetField(poTiff, TIFFTAG_IMAGEWIDTH, nSize);
+    TIFFSetField(poTiff, TIFFTAG_IMAGELENGTH, nSize);
+    TIFFSetField(poTiff, TIFFTAG_BITSPERSAMPLE, 8);
+    TIFFSetField(poTiff, TIFFTAG_SAMPLESPERPIXEL, 1);
+    TIFFSetField(poTiff, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
+    TIFFSetField(poTiff, TIFFTAG_TILEWIDTH, 512);
+    TIFFSetField(poTiff, TIFFTAG_TILELENGTH, 512);
+    TIFFSetField(poTiff, TIFFTAG_IMAGEDESCRIPTION, pDescription);
+    std::string tile(512 * 512, '\0');
+    TIFFWriteEncodedTile(poTiff, 0, tile.data(), static_cast<tmsize_t>(tile.size()));
+    TIFFClose(poTiff);
+}
+
+TEST(Command, ForeignBytesInMetadataKeepTheJsonValid)
+{
+    const TempFolder oFolder;
+    const std::string file = oFolder.File("bytes.tif");
+    WriteSparse(file, 16, "caf\xE9 \xFF\xFE\x01 end");
+    const auto oRun = RunKrv({"info", file, "--json"});
+    ASSERT_EQ(oRun.code, 0) << oRun.errors;
+    EXPECT_NE(oRun.Json()["metadata"].dump().find(" end"), std::string::npos);
+    EXPECT_EQ(RunKrv({"info", file}).output.find('\x01'), std::string::npos);
+}
+
+TEST(Command, StopsCleanlyWhenInterrupted)
+{
+    const TempFolder oFolder;
+    const std::string file = oFolder.File("vast.tif"), target = oFolder.File("vast.png");
+    WriteSparse(file, 200000, "vast");
+    const auto oRun = RunProgram(KRV_PROGRAM, {"view", file, target}, {}, 700);
+    EXPECT_EQ(oRun.code, 1);
+    EXPECT_EQ(oRun.errors, "krv: stopped\n");
+    EXPECT_FALSE(std::filesystem::exists(target));
+}
+
+} // namespace
+
+} // namespace krv::tool

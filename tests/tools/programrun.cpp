@@ -1,0 +1,70 @@
+#include "tests/tools/programrun.h"
+
+#include "tests/support/tempfolder.h"
+
+#include <fcntl.h>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <csignal>
+#include <stdexcept>
+#include <thread>
+
+extern char** environ;
+
+namespace krv::test
+{
+
+namespace
+{
+
+std::vector<char*> Pointers(std::vector<std::string>& oTexts)
+{
+    std::vector<char*> oPointers;
+    for (std::string& text : oTexts)
+        oPointers.push_back(text.data());
+    oPointers.push_back(nullptr);
+    return oPointers;
+}
+
+} // namespace
+
+ProgramRun RunProgram(const std::string& program, const std::vector<std::string>& oArguments,
+                      const std::vector<std::string>& oEnvironment, unsigned int nInterruptAfterMs)
+{
+    const TempFolder oFolder;
+    const std::string output = oFolder.File("output"), errors = oFolder.File("errors");
+    posix_spawn_file_actions_t oActions;
+    posix_spawn_file_actions_init(&oActions);
+    posix_spawn_file_actions_addopen(&oActions, 0, "/dev/null", O_RDONLY, 0);
+    posix_spawn_file_actions_addopen(&oActions, 1, output.c_str(), O_WRONLY | O_CREAT, 0600);
+    posix_spawn_file_actions_addopen(&oActions, 2, errors.c_str(), O_WRONLY | O_CREAT, 0600);
+    std::vector<std::string> oAllArguments{program};
+    oAllArguments.insert(oAllArguments.end(), oArguments.begin(), oArguments.end());
+    std::vector<std::string> oAllEnvironment = oEnvironment; // the first of a name counts
+    for (char** p = environ; *p != nullptr; ++p)
+        oAllEnvironment.emplace_back(*p);
+    pid_t nProcess = 0;
+    const int nError = posix_spawn(&nProcess, program.c_str(), &oActions, nullptr, Pointers(oAllArguments).data(),
+                                   Pointers(oAllEnvironment).data());
+    posix_spawn_file_actions_destroy(&oActions);
+    if (nError != 0)
+        throw std::runtime_error(program + " could not be started");
+    if (nInterruptAfterMs != 0)
+    {
+        std::this_thread::sleep_for(std::chrono::milliseconds(nInterruptAfterMs));
+        kill(nProcess, SIGINT);
+    }
+    int nStatus = 0;
+    waitpid(nProcess, &nStatus, 0);
+    return {WIFEXITED(nStatus) ? WEXITSTATUS(nStatus) : 128 + WTERMSIG(nStatus), ReadFile(output), ReadFile(errors)};
+}
+
+ProgramRun RunKrv(const std::vector<std::string>& oArguments, const std::vector<std::string>& oEnvironment)
+{
+    return RunProgram(KRV_PROGRAM, oArguments, oEnvironment);
+}
+
+} // namespace krv::test

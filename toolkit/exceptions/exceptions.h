@@ -1,0 +1,154 @@
+#pragma once
+
+#include "toolkit/api.h"
+#include "toolkit/exceptions/place.h"
+
+#include <exception>
+#include <string>
+#include <vector>
+
+namespace krv
+{
+
+// Root of everything the toolkit throws. what() is the message; the place says where it was thrown.
+class KRV_TOOLKIT_API Exception : public std::exception
+{
+public:
+    explicit Exception(const std::string& message, const Place& oPlace = Place::Current());
+    Exception(const Exception&);
+    Exception& operator=(const Exception&);
+    ~Exception() override;
+
+    const char* what() const noexcept override;
+    const std::string& GetMessage() const { return moMessage; }
+    const std::string& GetFunction() const { return moFunction; }
+    const std::string& GetSourceFile() const { return moSourceFile; }
+    unsigned int GetLine() const { return mnLine; }
+
+private:
+    std::string moMessage;
+    std::string moFunction;
+    std::string moSourceFile;
+    unsigned int mnLine;
+};
+
+// Data or arguments that an operation cannot work with.
+class KRV_TOOLKIT_API DataException : public Exception
+{
+public:
+    explicit DataException(const std::string& message, const Place& oPlace = Place::Current());
+    ~DataException() override;
+};
+
+// A parameter outside its set of values.
+class KRV_TOOLKIT_API ParameterException : public Exception
+{
+public:
+    enum eType
+    {
+        eInvalidValue = 1
+    };
+
+    ParameterException(const std::string& message, int nType, const std::string& parameter,
+                       const Place& oPlace = Place::Current());
+    ~ParameterException() override;
+
+    int GetType() const { return mnType; }
+    const std::string& GetParameter() const { return moParameter; }
+
+private:
+    int mnType;
+    std::string moParameter;
+};
+
+// Something is wrong with a file; the base of the kinds below.
+class KRV_TOOLKIT_API FileException : public Exception
+{
+public:
+    FileException(const std::string& fileName, const std::string& message, const Place& oPlace = Place::Current());
+    ~FileException() override;
+
+    const std::string& GetFileName() const { return moFileName; }
+
+private:
+    std::string moFileName;
+};
+
+// The file is not there or cannot be opened.
+class KRV_TOOLKIT_API FileNotFoundException : public FileException
+{
+public:
+    FileNotFoundException(const std::string& fileName, const std::string& message,
+                          const Place& oPlace = Place::Current());
+    ~FileNotFoundException() override;
+};
+
+// The file is in no known format, or is damaged.
+class KRV_TOOLKIT_API FileFormatException : public FileException
+{
+public:
+    FileFormatException(const std::string& fileName, const std::string& message,
+                        const Place& oPlace = Place::Current());
+    ~FileFormatException() override;
+};
+
+// Reading or writing failed.
+class KRV_TOOLKIT_API IOException : public FileException
+{
+public:
+    IOException(const std::string& fileName, const std::string& message, const Place& oPlace = Place::Current());
+    ~IOException() override;
+};
+
+// A call to the operating system failed.
+class KRV_TOOLKIT_API OSException : public Exception
+{
+public:
+    // nError: the system's error number (errno).
+    OSException(int nError, const std::string& message, const Place& oPlace = Place::Current());
+    ~OSException() override;
+
+    int GetError() const { return mnError; }
+
+private:
+    int mnError;
+};
+
+// A plug-in library cannot be used.
+class KRV_TOOLKIT_API LibraryException : public Exception
+{
+public:
+    enum eType
+    {
+        eLibraryNotFound = 1,
+        eEntryPointNotFound = 2,
+        eVersionMismatch = 3
+    };
+
+    LibraryException(const std::string& libraryFile, int nType, const std::string& message,
+                     const Place& oPlace = Place::Current());
+    ~LibraryException() override;
+
+    const std::string& GetLibraryFile() const { return moLibraryFile; }
+    int GetType() const { return mnType; }
+
+private:
+    std::string moLibraryFile;
+    int mnType;
+};
+
+// An index outside its range; carries the offending indices.
+class KRV_TOOLKIT_API OutOfBoundsException : public Exception
+{
+public:
+    OutOfBoundsException(const std::vector<unsigned int>& oIndices, const std::string& message,
+                         const Place& oPlace = Place::Current());
+    ~OutOfBoundsException() override;
+
+    const std::vector<unsigned int>& GetIndices() const { return moIndices; }
+
+private:
+    std::vector<unsigned int> moIndices;
+};
+
+} // namespace krv

@@ -1,0 +1,65 @@
+#pragma once
+
+#include <source_location>
+#include <string>
+#include <string_view>
+
+namespace krv
+{
+
+// Turns a compiler's file name into the name by which the library reports a source file: the path from the root of the
+// source tree without its ending, such as "datasources/reader/basicreader".
+constexpr std::string_view SourceFileText(std::string_view file)
+{
+    constexpr std::string_view ROOTS[] = {"datasources/", "toolkit/", "gobs/", "plugins/", "tools/"};
+    for (std::string_view root : ROOTS)
+    {
+        const auto nAt = file.rfind(root);
+        if (nAt != std::string_view::npos && (nAt == 0 || file[nAt - 1] == '/'))
+        {
+            file.remove_prefix(nAt);
+            break;
+        }
+    }
+    const auto nDot = file.rfind('.');
+    return nDot == std::string_view::npos ? file : file.substr(0, nDot);
+}
+
+// Where an exception was thrown: the full signature of the function, the source file and the line. Costs nothing to
+// make and holds no memory of its own; its texts live as long as the library. As a default argument `const Place&
+// oPlace = Place::Current()` it names the caller.
+class Place
+{
+public:
+    constexpr Place(const char* pFunction, std::string_view sourceFile, unsigned int nLine)
+        : mpFunction(pFunction), moSourceFile(sourceFile), mnLine(nLine)
+    {
+    }
+
+    // The place of the call; a function that throws on behalf of a public operation takes its place as an argument.
+    static constexpr Place Current(std::source_location oLocation = std::source_location::current())
+    {
+        return AtLine(oLocation.line(), oLocation);
+    }
+
+    // As Current, with a line number that is part of the contract of the operation.
+    static constexpr Place AtLine(unsigned int nLine, std::source_location oLocation = std::source_location::current())
+    {
+        return {oLocation.function_name(), oLocation.file_name(), nLine};
+    }
+
+    // Empty texts and line 0, for the throws that deliberately say no place.
+    static constexpr Place None() { return {"", "", 0}; }
+
+    std::string GetFunction() const { return mpFunction; }
+    // In the form of SourceFileText.
+    std::string GetSourceFile() const { return std::string(SourceFileText(moSourceFile)); }
+    unsigned int GetLine() const { return mnLine; }
+
+private:
+    const char* mpFunction;
+    std::string_view moSourceFile;
+    unsigned int mnLine;
+};
+
+} // namespace krv

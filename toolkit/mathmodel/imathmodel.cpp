@@ -1,0 +1,8 @@
+#include "toolkit/mathmodel/imathmodel.h"
+
+namespace krv::mathmodel
+{
+
+IMathModel::~IMathModel() = default;
+
+} // namespace krv::mathmodel

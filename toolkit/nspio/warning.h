@@ -1,0 +1,25 @@
+#pragma once
+
+#include "toolkit/api.h"
+
+#include <functional>
+#include <string>
+
+namespace krv::nspio
+{
+
+// Where warnings go. Nothing sets a sink: they are written to the standard error output, one line each.
+class KRV_TOOLKIT_API Warning
+{
+public:
+    // message, source file, line
+    using Sink = std::function<void(const std::string&, const std::string&, unsigned int)>;
+
+    // Any thread. An exception of the sink passes.
+    static void Warn(const std::string& message, const std::string& sourceFile, unsigned int nLine);
+
+    // Replaces the sink and returns the former one; an empty sink is the standard one.
+    static Sink SetSink(Sink oSink);
+};
+
+} // namespace krv::nspio

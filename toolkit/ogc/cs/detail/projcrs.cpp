@@ -1,0 +1,263 @@
+#include "toolkit/ogc/cs/detail/projcrs.h"
+
+#include "toolkit/exceptions/exceptions.h"
+
+#include <charconv>
+#include <string_view>
+#include <utility>
+
+namespace krv::ogc::cs::detail
+{
+namespace
+{
+
+std::string Text(const char* poText)
+{
+    return poText == nullptr ? std::string() : std::string(poText);
+}
+
+bool IsGeographicType(PJ_TYPE eType)
+{
+    return eType == PJ_TYPE_GEOGRAPHIC_2D_CRS || eType == PJ_TYPE_GEOGRAPHIC_3D_CRS;
+}
+
+int FindEPSGCode(const PJ* poObject)
+{
+    for (int nAt = 0; proj_get_id_auth_name(poObject, nAt) != nullptr; ++nAt)
+    {
+        const std::string code = Text(proj_get_id_code(poObject, nAt));
+        int nCode = 0;
+        const auto oResult = std::from_chars(code.data(), code.data() + code.size(), nCode);
+        const bool bNumber = oResult.ec == std::errc() && oResult.ptr == code.data() + code.size();
+        if (bNumber && std::string_view(proj_get_id_auth_name(poObject, nAt)) == "EPSG")
+            return nCode;
+    }
+    return 0;
+}
+
+} // namespace
+
+ProjCRS::ProjCRS(std::unique_ptr<ProjContext> poContext, ProjObject poObject)
+    : mpoContext(std::move(poContext)), mpoObject(std::move(poObject))
+{
+}
+
+ProjCRS::~ProjCRS() = default;
+
+ICRS* ProjCRS::Clone() const
+{
+    auto poContext = std::make_unique<ProjContext>();
+    ProjObject poObject = MakeObject(*poContext, *this, Place::Current());
+    return std::make_unique<ProjCRS>(std::move(poContext), std::move(poObject)).release();
+}
+
+std::string ProjCRS::GetName() const
+{
+    const std::string name = Text(proj_get_name(mpoObject.get()));
+    return name.empty() ? "unknown" : name;
+}
+
+int ProjCRS::GetEPSG() const
+{
+    const int nCode = FindEPSGCode(mpoObject.get());
+    return nCode != 0 ? nCode : FindEPSGCode(Horizontal().get());
+}
+
+std::string ProjCRS::GetWKT() const
+{
+    return Export(PJ_WKT2_2019, "WKT2");
+}
+
+std::string ProjCRS::GetWKT1() const
+{
+    return Export(PJ_WKT1_GDAL, "WKT1");
+}
+
+std::string ProjCRS::GetPROJJSON() const
+{
+    const char* const OPTIONS[] = {"MULTILINE=NO", nullptr};
+    const char* poText = proj_as_projjson(mpoContext->Get(), mpoObject.get(), OPTIONS);
+    if (poText == nullptr)
+        mpoContext->Fail("\"" + GetName() + "\" cannot be written as PROJJSON", Place::Current());
+    return poText;
+}
+
+bool ProjCRS::IsEquivalent(const ICRS& oOther) const
+{
+    PJ_CONTEXT* poContext = mpoContext->Get();
+    const ProjObject poOther = MakeObject(*mpoContext, oOther, Place::Current());
+    const ProjObject poLeft(proj_normalize_for_visualization(poContext, mpoObject.get()));
+    const ProjObject poRight(proj_normalize_for_visualization(poContext, poOther.get()));
+    return proj_is_equivalent_to_with_ctx(poContext, poLeft ? poLeft.get() : mpoObject.get(),
+                                          poRight ? poRight.get() : poOther.get(),
+                                          PJ_COMP_EQUIVALENT_EXCEPT_AXIS_ORDER_GEOGCRS) != 0;
+}
+
+bool ProjCRS::IsGeographic() const
+{
+    return IsGeographicType(proj_get_type(Horizontal().get()));
+}
+
+bool ProjCRS::IsProjected() const
+{
+    return proj_get_type(Horizontal().get()) == PJ_TYPE_PROJECTED_CRS;
+}
+
+bool ProjCRS::HasVertical() const
+{
+    PJ_CONTEXT* poContext = mpoContext->Get();
+    ProjObject poObject = Share(mpoObject.get());
+    while (poObject && proj_get_type(poObject.get()) == PJ_TYPE_BOUND_CRS)
+        poObject.reset(proj_get_source_crs(poContext, poObject.get()));
+    const PJ_TYPE eType = proj_get_type(poObject.get());
+    if (eType == PJ_TYPE_COMPOUND_CRS || eType == PJ_TYPE_VERTICAL_CRS)
+        return true;
+    const ProjObject poSystem(proj_crs_get_coordinate_system(poContext, poObject.get()));
+    return poSystem && proj_cs_get_axis_count(poContext, poSystem.get()) == 3;
+}
+
+std::string ProjCRS::GetUnitName() const
+{
+    return HorizontalUnit().name;
+}
+
+double ProjCRS::GetUnitFactor() const
+{
+    return HorizontalUnit().factor;
+}
+
+std::string ProjCRS::GetDatumName() const
+{
+    PJ_CONTEXT* poContext = mpoContext->Get();
+    const ProjObject poHorizontal = Horizontal();
+    const ProjObject poGeodetic(proj_crs_get_geodetic_crs(poContext, poHorizontal.get()));
+    const PJ* poOwner = poGeodetic ? poGeodetic.get() : poHorizontal.get();
+    ProjObject poDatum(proj_crs_get_datum(poContext, poOwner));
+    if (!poDatum)
+        poDatum.reset(proj_crs_get_datum_ensemble(poContext, poOwner));
+    return poDatum ? Text(proj_get_name(poDatum.get())) : std::string();
+}
+
+std::string ProjCRS::GetEllipsoidName() const
+{
+    return FindEllipsoid().name;
+}
+
+double ProjCRS::GetSemiMajorAxis() const
+{
+    return FindEllipsoid().semiMajor;
+}
+
+double ProjCRS::GetInverseFlattening() const
+{
+    return FindEllipsoid().inverseFlattening;
+}
+
+std::string ProjCRS::GetProjectionMethod() const
+{
+    const char* poName = nullptr;
+    const ProjObject poConversion = Conversion();
+    if (poConversion)
+        proj_coordoperation_get_method_info(mpoContext->Get(), poConversion.get(), &poName, nullptr, nullptr);
+    return Text(poName);
+}
+
+std::vector<ProjectionParameter> ProjCRS::GetProjectionParameters() const
+{
+    std::vector<ProjectionParameter> oParameters;
+    const ProjObject poConversion = Conversion();
+    const int nCount = poConversion ? proj_coordoperation_get_param_count(mpoContext->Get(), poConversion.get()) : 0;
+    for (int nAt = 0; nAt < nCount; ++nAt)
+    {
+        const char* poName = nullptr;
+        const char* poUnit = nullptr;
+        ProjectionParameter oParameter;
+        if (proj_coordoperation_get_param(mpoContext->Get(), poConversion.get(), nAt, &poName, nullptr, nullptr,
+                                          &oParameter.value, nullptr, &oParameter.unitFactor, &poUnit, nullptr, nullptr,
+                                          nullptr) == 0)
+            continue;
+        oParameter.name = Text(poName);
+        oParameter.unitName = Text(poUnit);
+        oParameters.push_back(std::move(oParameter));
+    }
+    return oParameters;
+}
+
+ProjObject ProjCRS::Share(const PJ* poObject) const
+{
+    return ProjObject(proj_clone(mpoContext->Get(), poObject));
+}
+
+// The part that places pixels: below bound and compound systems.
+ProjObject ProjCRS::Horizontal() const
+{
+    PJ_CONTEXT* poContext = mpoContext->Get();
+    ProjObject poObject = Share(mpoObject.get());
+    for (;;)
+    {
+        const PJ_TYPE eType = proj_get_type(poObject.get());
+        ProjObject poInner;
+        if (eType == PJ_TYPE_BOUND_CRS)
+            poInner.reset(proj_get_source_crs(poContext, poObject.get()));
+        else if (eType == PJ_TYPE_COMPOUND_CRS)
+            poInner.reset(proj_crs_get_sub_crs(poContext, poObject.get(), 0));
+        if (!poInner)
+            return poObject;
+        poObject = std::move(poInner);
+    }
+}
+
+ProjObject ProjCRS::Conversion() const
+{
+    const ProjObject poHorizontal = Horizontal();
+    if (proj_get_type(poHorizontal.get()) != PJ_TYPE_PROJECTED_CRS)
+        return nullptr;
+    return ProjObject(proj_crs_get_coordoperation(mpoContext->Get(), poHorizontal.get()));
+}
+
+ProjCRS::Unit ProjCRS::HorizontalUnit() const
+{
+    PJ_CONTEXT* poContext = mpoContext->Get();
+    const ProjObject poSystem(proj_crs_get_coordinate_system(poContext, Horizontal().get()));
+    Unit oUnit;
+    const char* poName = nullptr;
+    if (poSystem && proj_cs_get_axis_info(poContext, poSystem.get(), 0, nullptr, nullptr, nullptr, &oUnit.factor,
+                                          &poName, nullptr, nullptr) != 0)
+        oUnit.name = Text(poName);
+    return oUnit;
+}
+
+ProjCRS::Ellipsoid ProjCRS::FindEllipsoid() const
+{
+    PJ_CONTEXT* poContext = mpoContext->Get();
+    Ellipsoid oEllipsoid;
+    const ProjObject poEllipsoid(proj_get_ellipsoid(poContext, Horizontal().get()));
+    if (!poEllipsoid)
+        return oEllipsoid;
+    oEllipsoid.name = Text(proj_get_name(poEllipsoid.get()));
+    proj_ellipsoid_get_parameters(poContext, poEllipsoid.get(), &oEllipsoid.semiMajor, nullptr, nullptr,
+                                  &oEllipsoid.inverseFlattening);
+    return oEllipsoid;
+}
+
+std::string ProjCRS::Export(PJ_WKT_TYPE eType, const char* poKind) const
+{
+    const char* const OPTIONS[] = {"MULTILINE=NO", nullptr};
+    const char* poText = proj_as_wkt(mpoContext->Get(), mpoObject.get(), eType, OPTIONS);
+    if (poText == nullptr)
+        mpoContext->Fail("\"" + GetName() + "\" cannot be written as " + poKind, Place::Current());
+    return poText;
+}
+
+ProjObject MakeObject(const ProjContext& oContext, const ICRS& oCRS, const Place& oPlace)
+{
+    const auto* poOwn = dynamic_cast<const ProjCRS*>(&oCRS);
+    if (poOwn == nullptr)
+        return ParseDefinition(oContext, oCRS.GetWKT(), oPlace);
+    ProjObject poObject(proj_clone(oContext.Get(), poOwn->GetObject()));
+    if (!poObject)
+        oContext.Fail("\"" + oCRS.GetName() + "\" cannot be copied", oPlace);
+    return poObject;
+}
+
+} // namespace krv::ogc::cs::detail

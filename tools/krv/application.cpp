@@ -1,0 +1,105 @@
+#include "tools/krv/application.h"
+
+#include "toolkit/nspio/warning.h"
+#include "tools/krv/errors.h"
+#include "tools/krv/interrupt.h"
+#include "tools/krv/verbs/verbs.h"
+
+#include <CLI/CLI.hpp>
+
+#include <algorithm>
+#include <cstdio>
+#include <string>
+#include <vector>
+
+namespace krv::tool
+{
+
+namespace
+{
+
+constexpr char FOOTER[] = "Examples:\n"
+                          "  krv info scene.tif                     everything known of a file\n"
+                          "  krv stats scene.tif --json             statistics per channel, for other programs\n"
+                          "  krv view scene.tif look.png --size 800 a quick look\n"
+                          "  krv doctor scene.tif                   why a file does or does not open\n"
+                          "`krv VERB --help` explains a verb. Exit code: 0 done, 1 failed, 2 wrong usage.\n"
+                          "Formats are found below the folder that KRVHOME names, else beside the library.";
+
+// Warnings that the library gave, each once. They are told at the end, except one that is the error itself.
+std::vector<std::string>& Warnings()
+{
+    static std::vector<std::string> oWarnings;
+    return oWarnings;
+}
+
+void NoteWarning(const std::string& message, const std::string&, unsigned int)
+{
+    auto& oWarnings = Warnings();
+    if (!message.empty() && std::find(oWarnings.begin(), oWarnings.end(), message) == oWarnings.end())
+        oWarnings.push_back(message);
+}
+
+void TellWarnings(const std::string& error)
+{
+    for (const std::string& warning : Warnings())
+    {
+        if (OneLine(warning) != error)
+            std::fprintf(stderr, "krv: warning: %s\n", OneLine(warning).c_str());
+    }
+}
+
+int RunVerb(const Selection& oSelection, bool bVerbose)
+{
+    try
+    {
+        const int nCode = oSelection.run();
+        TellWarnings("");
+        return nCode;
+    }
+    catch (const UsageError& oError)
+    {
+        std::fprintf(stderr, "krv: %s\n", OneLine(oError.what()).c_str());
+        return 2;
+    }
+    catch (...)
+    {
+        TellWarnings(CurrentMessage());
+        std::fprintf(stderr, "krv: %s\n", DescribeError(oSelection.file, bVerbose).c_str());
+        return 1;
+    }
+}
+
+} // namespace
+
+int RunApplication(int nArguments, char** pArguments)
+{
+    CLI::App oApp("Reads raster files of every format that has a plug-in.", "krv");
+    Selection oSelection;
+    bool bVerbose = false;
+    oApp.set_version_flag("--version", "krv " KRV_VERSION);
+    oApp.add_flag("--verbose", bVerbose, "Errors also name the function, source file and line");
+    oApp.require_subcommand(1);
+    oApp.fallthrough();
+    AddFormatsVerb(oApp, oSelection);
+    AddInfoVerb(oApp, oSelection);
+    AddChecksumVerb(oApp, oSelection);
+    AddStatsVerb(oApp, oSelection);
+    AddViewVerb(oApp, oSelection);
+    AddWalkVerb(oApp, oSelection);
+    AddDoctorVerb(oApp, oSelection);
+    oApp.footer(FOOTER); // after the verbs, which would take it over
+    try
+    {
+        oApp.parse(nArguments, pArguments);
+    }
+    catch (const CLI::ParseError& oError)
+    {
+        return oApp.exit(oError) == 0 ? 0 : 2;
+    }
+    krv::nspio::Warning::SetSink(&NoteWarning);
+    WatchForInterrupt();
+    return RunVerb(oSelection, bVerbose);
+}
+
+} // namespace krv::tool

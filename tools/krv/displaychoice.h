@@ -1,0 +1,34 @@
+#pragma once
+
+#include "gobs/pct/pct.h"
+
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace krv::tool
+{
+
+class SourceFile;
+
+// Which channels of a file make a picture, and what belongs to them.
+struct DisplayChoice
+{
+    std::vector<unsigned int> channels;    // one, or red, green and blue; four inks: cyan, magenta, yellow, black
+    std::shared_ptr<krv::gobs::PCT> table; // colours of the one channel; null: grey
+    bool inverted = false;                 // small values are bright
+    unsigned int alphaChannel = 0;         // opacity; 0: none
+    float alphaFull = 255;                 // the alpha channel's value for opaque
+    bool premultiplied = false;            // colours are multiplied by their opacity
+    float inkFull = 255;                   // the value of an ink that covers fully
+    unsigned int maskBitmap = 0;           // bitmap whose set bits are valid pixels; 0: none
+    std::string reason;                    // why these channels, for the user
+};
+
+// In this order: the channels asked for; the file's display defaults; a colour table of the first channel; channels
+// that are described as red, green and blue; the four inks of a separated image; the first three channels; the first.
+// A channel described as alpha is opacity unless it is asked for. Throws UsageError for channels that are not there,
+// and for two or more than three.
+DisplayChoice ChooseDisplay(const SourceFile& oFile, const std::vector<unsigned int>& oWanted);
+
+} // namespace krv::tool

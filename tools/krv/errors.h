@@ -1,0 +1,31 @@
+#pragma once
+
+#include <stdexcept>
+#include <string>
+
+namespace krv::tool
+{
+
+// The command line asks for something that does not make sense.
+class UsageError : public std::runtime_error
+{
+public:
+    using std::runtime_error::runtime_error;
+};
+
+// What the exception that is being handled means to the user, on one line: file, cause, and what to do about it. To be
+// called in a catch block only. file: the file that the verb works on, for exceptions that name none.
+// With bVerbose the function, source file and line of the throw follow in brackets.
+std::string DescribeError(const std::string& file, bool bVerbose);
+
+// What the exception that is being handled says by itself, on one line, whatever its kind.
+std::string CurrentMessage();
+
+// The text with line breaks and other control characters turned into blanks.
+std::string OneLine(const std::string& text);
+
+// Why a file cannot be opened, from the operating system: "there is no such file", "it is a folder", ... ; empty when
+// nothing stands against it.
+std::string WhyUnreadable(const std::string& file);
+
+} // namespace krv::tool

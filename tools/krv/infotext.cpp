@@ -1,0 +1,137 @@
+#include "tools/krv/errors.h"
+#include "tools/krv/fileinfo.h"
+
+#include <fmt/format.h>
+
+namespace krv::tool
+{
+
+namespace
+{
+
+constexpr std::size_t LONGEST_VALUE = 300;
+
+// On one line, and not longer than a few lines of a terminal; never cut inside a UTF-8 character.
+std::string Short(const std::string& text)
+{
+    std::string line = OneLine(text);
+    if (line.size() <= LONGEST_VALUE)
+        return line;
+    std::size_t nEnd = LONGEST_VALUE;
+    while (nEnd > 0 && (static_cast<unsigned char>(line[nEnd]) & 0xC0U) == 0x80U)
+        --nEnd;
+    return line.substr(0, nEnd) + fmt::format(" ... ({} characters)", text.size());
+}
+
+std::string Text(const Json& oJson)
+{
+    if (oJson.is_null())
+        return "-";
+    return oJson.is_string() ? Short(oJson.get<std::string>()) : oJson.dump();
+}
+
+std::string Line(const char* pLabel, const std::string& text)
+{
+    return fmt::format("  {:<12}{}\n", pLabel, text);
+}
+
+std::string MapText(const Json& oMap, const char* pIndent)
+{
+    std::string text;
+    for (const auto& [key, value] : oMap.items())
+        text += fmt::format("{}{} = {}\n", pIndent, Short(key), Text(value));
+    return text;
+}
+
+std::string GeocodingText(const Json& oTerms)
+{
+    const auto Term = [&oTerms](int i)
+    {
+        return oTerms[static_cast<std::size_t>(i)].get<double>();
+    };
+    if (Term(2) == 0 && Term(4) == 0)
+        return Line("origin", fmt::format("{}, {}", Term(0), Term(3))) +
+               Line("pixel", fmt::format("{} x {}", Term(1), Term(5)));
+    return Line("geocoding", fmt::format("x = {} + {} column + {} row", Term(0), Term(1), Term(2))) +
+           Line("", fmt::format("y = {} + {} column + {} row", Term(3), Term(4), Term(5)));
+}
+
+std::string CrsText(const Json& oCrs)
+{
+    const std::string code = oCrs["epsg"].is_null() ? "" : " (EPSG:" + oCrs["epsg"].dump() + ")";
+    return Line("crs", Text(oCrs["name"]) + code);
+}
+
+std::string ReferenceText(const char* pLabel, const Json& oReference)
+{
+    if (!oReference.is_object())
+        return {};
+    return fmt::format("       {}: file {}, {} {}\n", pLabel, Text(oReference["file"]), Text(oReference["layer"]),
+                       Text(oReference["number"]));
+}
+
+std::string ChannelText(const Json& oChannel)
+{
+    std::string text = fmt::format("    {:>3}  {:<5}", oChannel["number"].get<unsigned int>(), Text(oChannel["type"]));
+    if (oChannel["storedType"] != oChannel["type"])
+        text += " (stored as " + Text(oChannel["storedType"]) + ")";
+    if (!oChannel["description"].is_null())
+        text += "  " + Text(oChannel["description"]);
+    if (!oChannel["noData"].is_null())
+        text += "  no-data " + Text(oChannel["noData"]);
+    text += "\n" + MapText(oChannel["metadata"], "         ");
+    if (oChannel.contains("defaultLUT"))
+        text += ReferenceText("lookup table", oChannel["defaultLUT"]) +
+                ReferenceText("colour table", oChannel["defaultPCT"]);
+    return text;
+}
+
+std::string OverviewsText(const Json& oLevels)
+{
+    std::string text;
+    for (const Json& oLevel : oLevels)
+        text += fmt::format("{}{}: {} x {}", text.empty() ? "" : ", ", oLevel["level"].get<unsigned int>(),
+                            oLevel["width"].get<unsigned int>(), oLevel["height"].get<unsigned int>());
+    return text.empty() ? "" : Line("overviews", text);
+}
+
+std::string DisplayText(const Json& oDisplay)
+{
+    std::string text;
+    for (const auto& [colour, channel] : oDisplay.items())
+    {
+        if (!channel.is_null())
+            text += fmt::format("{}{} {}", text.empty() ? "" : ", ", colour, channel.dump());
+    }
+    return text.empty() ? "" : Line("display", text);
+}
+
+} // namespace
+
+std::string InfoText(const Json& oInfo)
+{
+    std::string text = Short(oInfo["file"].get<std::string>()) + "\n";
+    text += Line("format", Text(oInfo["format"]));
+    text += Line("size", fmt::format("{} x {} pixels, {} channel{}", Text(oInfo["width"]), Text(oInfo["height"]),
+                                     oInfo["channels"].size(), oInfo["channels"].size() == 1 ? "" : "s"));
+    text += Line("block", fmt::format("{} x {}", Text(oInfo["blockWidth"]), Text(oInfo["blockHeight"])));
+    text += oInfo["crs"].is_null() ? Line("crs", "-") : CrsText(oInfo["crs"]);
+    text += oInfo["geocoding"].is_null() ? Line("geocoding", "-") : GeocodingText(oInfo["geocoding"]);
+    text += OverviewsText(oInfo["overviews"]);
+    for (const Json& oBitmap : oInfo["bitmaps"])
+        text += Line("bitmap", fmt::format("{}  {}", Text(oBitmap["number"]), Text(oBitmap["description"])));
+    for (const Json& oTable : oInfo["colourTables"])
+        text += Line("colours", fmt::format("table {} of channel {}, {} entries", Text(oTable["number"]),
+                                            Text(oTable["channel"]), Text(oTable["entries"])));
+    if (!oInfo["mathModels"].empty())
+        text += Line("math models", oInfo["mathModels"].dump());
+    text += DisplayText(oInfo["displayDefaults"]);
+    text += "  channels\n";
+    for (const Json& oChannel : oInfo["channels"])
+        text += ChannelText(oChannel);
+    if (!oInfo["metadata"].empty())
+        text += "  metadata\n" + MapText(oInfo["metadata"], "    ");
+    return text;
+}
+
+} // namespace krv::tool

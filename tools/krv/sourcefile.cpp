@@ -1,0 +1,170 @@
+#include "tools/krv/sourcefile.h"
+
+#include "datasources/interfaces/ichannelinfo.h"
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "datasources/reader/basicreader.h"
+#include "datasources/reader/ioverviewaccessor.h"
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/warning.h"
+#include "tools/krv/errors.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+
+namespace krv::tool
+{
+
+using krv::datasources::IOverviewReaderAccessor;
+using krv::datasources::IRasterReader;
+
+namespace
+{
+
+std::unique_ptr<krv::datasources::IDataset> OpenDataset(const std::string& name)
+{
+    std::unique_ptr<krv::datasources::IDataset> poDataset(
+        krv::datasources::DatasetManager::GetInstance()->Open(name, eReadOnly));
+    if (poDataset == nullptr)
+        throw krv::FileFormatException(name, "its format recognised it and then opened nothing");
+    return poDataset;
+}
+
+std::string LevelList(const IOverviewReaderAccessor& oAccessor)
+{
+    const auto oLevels = oAccessor.GetLevels();
+    return oLevels.empty() ? "there are none" : fmt::format("there are {}", fmt::join(oLevels, ", "));
+}
+
+bool Has(const IOverviewReaderAccessor& oAccessor, unsigned int nLevel)
+{
+    const auto oLevels = oAccessor.GetLevels();
+    return std::find(oLevels.begin(), oLevels.end(), nLevel) != oLevels.end() && oAccessor.IsLevelValid(nLevel);
+}
+
+} // namespace
+
+LevelReader::LevelReader(std::unique_ptr<IRasterReader> poFull, std::unique_ptr<IOverviewReaderAccessor> poAccessor,
+                         std::unique_ptr<IRasterReader> poLevel)
+    : mpoFull(std::move(poFull)), mpoAccessor(std::move(poAccessor)), mpoLevel(std::move(poLevel))
+{
+}
+
+LevelReader::LevelReader(LevelReader&&) noexcept = default;
+LevelReader::~LevelReader() = default;
+
+SourceFile::SourceFile(const std::string& name)
+    : moName(name), mpoDataset(OpenDataset(name)),
+      mpoRaster(dynamic_cast<krv::datasources::IRasterDataset*>(mpoDataset.get())),
+      moMetadata(mpoDataset->ReadAuxiliaryData())
+{
+}
+
+SourceFile::~SourceFile() = default;
+
+krv::datasources::IRasterDataset& SourceFile::GetRaster() const
+{
+    if (mpoRaster == nullptr || mpoRaster->GetChanCount() == 0)
+        throw krv::DataException(moName + ": the file holds no image");
+    return *mpoRaster;
+}
+
+unsigned int SourceFile::GetChannelCount() const
+{
+    return GetRaster().GetChanCount();
+}
+
+krv::gobs::DataType SourceFile::GetType(unsigned int nChannel) const
+{
+    const std::unique_ptr<krv::datasources::IChannelInfo> poInfo(GetRaster().GetChannelInfo(nChannel));
+    if (poInfo == nullptr)
+        throw krv::DataException(fmt::format("{}: channel {} has no description", moName, nChannel));
+    return poInfo->GetDataType();
+}
+
+std::string SourceFile::GetNoDataText(unsigned int nChannel) const
+{
+    return nChannel <= moMetadata.GetChannelCount() ? krv::datasources::GetNoDataText(moMetadata, nChannel)
+                                                    : std::string();
+}
+
+OptionalNoData SourceFile::GetNoData(unsigned int nChannel) const
+{
+    const std::string text = GetNoDataText(nChannel);
+    const OptionalNoData oValue = krv::datasources::ParseNoData(text);
+    if (!text.empty() && !oValue)
+        krv::nspio::Warning::Warn(
+            fmt::format("{}: the no-data value \"{}\" is no number and is not used", moName, text),
+            "tools/krv/sourcefile", 0);
+    return oValue;
+}
+
+std::vector<unsigned int> SourceFile::CheckChannels(const std::vector<unsigned int>& oChannels) const
+{
+    const unsigned int nCount = GetChannelCount();
+    std::vector<unsigned int> oResult = oChannels;
+    for (unsigned int i = 1; oChannels.empty() && i <= nCount; ++i)
+        oResult.push_back(i);
+    for (const unsigned int nChannel : oResult)
+    {
+        if (nChannel == 0 || nChannel > nCount)
+            throw UsageError(
+                fmt::format("{}: there is no channel {}; its channels are 1 to {}", moName, nChannel, nCount));
+    }
+    return oResult;
+}
+
+std::vector<ChannelGroup> SourceFile::GroupByType(const std::vector<unsigned int>& oChannels) const
+{
+    std::vector<ChannelGroup> oGroups;
+    std::vector<krv::gobs::DataType> oTypes;
+    for (std::size_t i = 0; i < oChannels.size(); ++i)
+    {
+        const krv::gobs::DataType oType = GetType(oChannels[i]);
+        const auto oFound = std::find(oTypes.begin(), oTypes.end(), oType);
+        const auto nGroup = static_cast<std::size_t>(oFound - oTypes.begin());
+        if (oFound == oTypes.end())
+        {
+            oTypes.push_back(oType);
+            oGroups.emplace_back();
+        }
+        oGroups[nGroup].channels.push_back(oChannels[i]);
+        oGroups[nGroup].positions.push_back(i);
+    }
+    return oGroups;
+}
+
+LevelReader SourceFile::Read(const std::vector<unsigned int>& oChannels, unsigned int nLevel) const
+{
+    auto poFull = std::make_unique<krv::datasources::BasicReader>(mpoDataset.get(), oChannels, false);
+    if (nLevel <= 1)
+        return {std::move(poFull), nullptr, nullptr};
+    std::unique_ptr<IOverviewReaderAccessor> poAccessor(poFull->GetOverviewReaderAccessor());
+    if (poAccessor == nullptr || !Has(*poAccessor, nLevel))
+        throw UsageError(fmt::format("{}: there is no level {}; {}", moName, nLevel,
+                                     poAccessor == nullptr ? "there are none" : LevelList(*poAccessor)));
+    std::unique_ptr<IRasterReader> poLevel(poAccessor->CreateRasterReader(nLevel));
+    return {std::move(poFull), std::move(poAccessor), std::move(poLevel)};
+}
+
+LevelReader SourceFile::ReadAtLeast(const std::vector<unsigned int>& oChannels, unsigned int nWidth,
+                                    unsigned int nHeight) const
+{
+    auto poFull = std::make_unique<krv::datasources::BasicReader>(mpoDataset.get(), oChannels, false);
+    std::unique_ptr<IOverviewReaderAccessor> poAccessor(poFull->GetOverviewReaderAccessor());
+    std::vector<unsigned int> oLevels = poAccessor != nullptr ? poAccessor->GetLevels() : std::vector<unsigned int>();
+    std::sort(oLevels.rbegin(), oLevels.rend());
+    for (const unsigned int nLevel : oLevels)
+    {
+        if (!poAccessor->IsLevelValid(nLevel))
+            continue;
+        std::unique_ptr<IRasterReader> poLevel(poAccessor->CreateRasterReader(nLevel));
+        if (poLevel->GetWidth() >= nWidth && poLevel->GetHeight() >= nHeight)
+            return {std::move(poFull), std::move(poAccessor), std::move(poLevel)};
+    }
+    return {std::move(poFull), nullptr, nullptr};
+}
+
+} // namespace krv::tool

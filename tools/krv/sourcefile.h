@@ -1,0 +1,89 @@
+#pragma once
+
+#include "datasources/metadata/auxiliarydata.h"
+#include "gobs/raster/datatype.h"
+#include "tools/krv/nodatamatch.h"
+
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace krv::datasources
+{
+class IDataset;
+class IOverviewReaderAccessor;
+class IRasterDataset;
+class IRasterReader;
+} // namespace krv::datasources
+
+namespace krv::tool
+{
+
+// A reader and, for a level, what it stands on.
+class LevelReader
+{
+public:
+    LevelReader(std::unique_ptr<krv::datasources::IRasterReader> poFull,
+                std::unique_ptr<krv::datasources::IOverviewReaderAccessor> poAccessor,
+                std::unique_ptr<krv::datasources::IRasterReader> poLevel);
+    LevelReader(LevelReader&&) noexcept;
+    ~LevelReader();
+
+    krv::datasources::IRasterReader& Get() const { return mpoLevel != nullptr ? *mpoLevel : *mpoFull; }
+
+private:
+    // In this order, so that the level's reader goes first.
+    std::unique_ptr<krv::datasources::IRasterReader> mpoFull;
+    std::unique_ptr<krv::datasources::IOverviewReaderAccessor> mpoAccessor;
+    std::unique_ptr<krv::datasources::IRasterReader> mpoLevel;
+};
+
+// Channels of one type, which one reader serves, and where each stands in the list that was grouped.
+struct ChannelGroup
+{
+    std::vector<unsigned int> channels;
+    std::vector<std::size_t> positions;
+};
+
+// A file opened for reading. Readers live at most as long as it.
+class SourceFile
+{
+public:
+    // Passes what the manager throws.
+    explicit SourceFile(const std::string& name);
+    ~SourceFile();
+
+    const std::string& GetName() const { return moName; }
+    krv::datasources::IDataset& GetDataset() const { return *mpoDataset; }
+    // Null when the file holds no image.
+    krv::datasources::IRasterDataset* FindRaster() const { return mpoRaster; }
+    // Throws DataException when the file holds no image.
+    krv::datasources::IRasterDataset& GetRaster() const;
+
+    unsigned int GetChannelCount() const;
+    krv::gobs::DataType GetType(unsigned int nChannel) const;
+    const krv::datasources::AuxiliaryData& GetMetadata() const { return moMetadata; }
+    // The channel's value of "NO_DATA_VALUE", else the file's, without white space around it; empty when there is none.
+    std::string GetNoDataText(unsigned int nChannel) const;
+    // The number in that text; a text that is none counts as no value, and a warning says so.
+    OptionalNoData GetNoData(unsigned int nChannel) const;
+
+    // All channels for an empty list. Throws UsageError for a channel that the file does not have.
+    std::vector<unsigned int> CheckChannels(const std::vector<unsigned int>& oChannels) const;
+    // By type, in the order in which the types appear.
+    std::vector<ChannelGroup> GroupByType(const std::vector<unsigned int>& oChannels) const;
+
+    // Channels of one type at full size (level 1) or at a level. Throws UsageError for a level that is not there.
+    LevelReader Read(const std::vector<unsigned int>& oChannels, unsigned int nLevel = 1) const;
+    // The coarsest level that is not smaller than the wanted size; full size when there is none.
+    LevelReader ReadAtLeast(const std::vector<unsigned int>& oChannels, unsigned int nWidth,
+                            unsigned int nHeight) const;
+
+private:
+    std::string moName;
+    std::unique_ptr<krv::datasources::IDataset> mpoDataset;
+    krv::datasources::IRasterDataset* mpoRaster; // a facet of the dataset
+    krv::datasources::AuxiliaryData moMetadata;
+};
+
+} // namespace krv::tool

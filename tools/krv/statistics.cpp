@@ -1,0 +1,378 @@
+#include "tools/krv/statistics.h"
+
+#include "datasources/reader/irasterreader.h"
+#include "datasources/reader/rasterrange.h"
+#include "gobs/raster/raster.h"
+#include "tools/krv/pixeltypes.h"
+#include "tools/krv/progress.h"
+
+#include <algorithm>
+#include <array>
+#include <cmath>
+#include <limits>
+#include <type_traits>
+
+namespace krv::tool
+{
+
+namespace
+{
+
+__extension__ using Wide = __int128;
+
+constexpr std::size_t RUN = 4096;
+
+// Count, sum and squared deviations of what was seen. Merging two of them is stable whatever their means are.
+struct Moments
+{
+    std::uint64_t count = 0;
+    long double mean = 0;
+    long double squares = 0; // sum of squared differences from the mean
+
+    void Merge(const Moments& oOther)
+    {
+        if (oOther.count == 0)
+            return;
+        const auto nAll = static_cast<long double>(count + oOther.count);
+        const long double nApart = oOther.mean - mean;
+        const auto nShare = static_cast<long double>(oOther.count) / nAll;
+        squares += oOther.squares + nApart * nApart * static_cast<long double>(count) * nShare;
+        mean += nApart * nShare;
+        count += oOther.count;
+    }
+};
+
+// Sums of functions of n values in eight lanes, so that the loop is vectorised without reordering by the compiler.
+template <typename Sum, typename T, typename Function>
+Sum LaneSum(const T* pValues, std::size_t n, Function oFunction)
+{
+    std::array<Sum, 8> oLanes{};
+    std::size_t i = 0;
+    for (; i + 8 <= n; i += 8)
+    {
+        for (std::size_t k = 0; k < 8; ++k)
+            oLanes[k] += oFunction(pValues[i + k]);
+    }
+    for (std::size_t k = 0; i < n; ++i, ++k)
+        oLanes[k] += oFunction(pValues[i]);
+    return ((oLanes[0] + oLanes[1]) + (oLanes[2] + oLanes[3])) + ((oLanes[4] + oLanes[5]) + (oLanes[6] + oLanes[7]));
+}
+
+// Integers of up to 16 bits: all sums are exact, so there is nothing to merge.
+class SmallSums
+{
+public:
+    template <typename T>
+    void Add(const T* pValues, std::size_t n)
+    {
+        using Square = std::uint32_t;
+        mnCount += n;
+        mnSum += LaneSum<std::int32_t>(pValues, n, [](T v) { return static_cast<std::int32_t>(v); });
+        mnSquares += LaneSum<std::uint64_t>(pValues, n,
+                                            [](T v)
+                                            {
+                                                const auto nValue = static_cast<std::int32_t>(v);
+                                                return static_cast<std::uint64_t>(static_cast<Square>(nValue) *
+                                                                                  static_cast<Square>(nValue));
+                                            });
+    }
+    long double GetMean() const { return static_cast<long double>(mnSum) / static_cast<long double>(mnCount); }
+    long double GetVariance() const
+    {
+        const auto n = static_cast<long double>(mnCount);
+        return static_cast<long double>(mnSquares * mnCount - Wide{mnSum} * mnSum) / n / n;
+    }
+
+private:
+    std::uint64_t mnCount = 0;
+    std::int64_t mnSum = 0;
+    Wide mnSquares = 0;
+};
+
+// Everything else: runs around their own mean, and the plain sum for the mean.
+template <typename Sum>
+class MergedSums
+{
+public:
+    template <typename T>
+    void Add(const T* pValues, std::size_t n)
+    {
+        const auto nCount = static_cast<long double>(n);
+        Moments oRun;
+        oRun.count = n;
+        if constexpr (std::is_integral_v<T>)
+        {
+            const Wide nSum = SumOf(pValues, n);
+            mnSum += nSum;
+            using Difference = std::conditional_t<sizeof(T) <= 4, std::int64_t, Wide>;
+            const auto nPivot = static_cast<Difference>(nSum / static_cast<Wide>(n));
+            const auto Apart = [nPivot](T v)
+            {
+                return static_cast<double>(static_cast<Difference>(v) - nPivot);
+            };
+            const double nFirst = LaneSum<double>(pValues, n, Apart);
+            const double nSecond = LaneSum<double>(pValues, n, [&](T v) { return Apart(v) * Apart(v); });
+            oRun.mean = static_cast<long double>(nSum) / nCount;
+            oRun.squares =
+                std::max(static_cast<long double>(nSecond) - static_cast<long double>(nFirst) * nFirst / nCount, 0.0L);
+        }
+        else
+        {
+            const double nSum = LaneSum<double>(pValues, n, [](T v) { return static_cast<double>(v); });
+            const double nMean = nSum / static_cast<double>(n);
+            const double nSquares = LaneSum<double>(pValues, n, [nMean](T v) { return (v - nMean) * (v - nMean); });
+            if (std::isfinite(nSquares))
+            {
+                mnSum += nSum;
+                oRun.mean = nMean;
+                oRun.squares = nSquares;
+            }
+            else
+                AddHuge(pValues, n, oRun);
+        }
+        moMoments.Merge(oRun);
+    }
+    long double GetMean() const { return static_cast<long double>(mnSum) / static_cast<long double>(moMoments.count); }
+    long double GetVariance() const { return moMoments.squares / static_cast<long double>(moMoments.count); }
+
+private:
+    template <typename T>
+    static Wide SumOf(const T* pValues, std::size_t n)
+    {
+        if constexpr (sizeof(T) <= 4)
+            return LaneSum<std::int64_t>(pValues, n, [](T v) { return static_cast<std::int64_t>(v); });
+        else
+            return LaneSum<Wide>(pValues, n, [](T v) { return static_cast<Wide>(v); });
+    }
+    // Values so large that their squares leave the range of a double.
+    template <typename T>
+    void AddHuge(const T* pValues, std::size_t n, Moments& oRun)
+    {
+        const auto nSum = LaneSum<long double>(pValues, n, [](T v) { return static_cast<long double>(v); });
+        const long double nMean = nSum / static_cast<long double>(n);
+        mnSum += nSum;
+        oRun.mean = nMean;
+        oRun.squares = LaneSum<long double>(pValues, n, [nMean](T v) { return (v - nMean) * (v - nMean); });
+    }
+
+    Sum mnSum = 0;
+    Moments moMoments;
+};
+
+template <typename T>
+using SumsFor = std::conditional_t<std::is_floating_point_v<T>, MergedSums<long double>,
+                                   std::conditional_t<sizeof(T) <= 2, SmallSums, MergedSums<Wide>>>;
+
+// Statistics of valid values of one type, run by run.
+template <typename T>
+class RunStatistics
+{
+public:
+    void Add(const T* pValues, std::size_t n)
+    {
+        if (n == 0)
+            return;
+        T nLow = mnLow, nHigh = mnHigh;
+        for (std::size_t i = 0; i < n; ++i)
+        {
+            nLow = pValues[i] < nLow ? pValues[i] : nLow;
+            nHigh = pValues[i] > nHigh ? pValues[i] : nHigh;
+        }
+        mnLow = nLow;
+        mnHigh = nHigh;
+        mnCount += n;
+        moSums.Add(pValues, n);
+    }
+
+    void Report(ChannelStatistics& oResult) const
+    {
+        oResult.valid = mnCount;
+        if (mnCount == 0)
+            return;
+        oResult.minimum = Exact(mnLow);
+        oResult.maximum = Exact(mnHigh);
+        oResult.mean = static_cast<double>(moSums.GetMean());
+        oResult.deviation = static_cast<double>(std::sqrt(moSums.GetVariance()));
+    }
+
+private:
+    static Json Exact(T nValue)
+    {
+        if constexpr (std::is_floating_point_v<T>)
+            return Json(static_cast<double>(nValue));
+        else if constexpr (std::is_signed_v<T>)
+            return Json(static_cast<std::int64_t>(nValue));
+        else
+            return Json(static_cast<std::uint64_t>(nValue));
+    }
+
+    std::uint64_t mnCount = 0;
+    T mnLow = std::numeric_limits<T>::max();
+    T mnHigh = std::numeric_limits<T>::lowest();
+    SumsFor<T> moSums;
+};
+
+template <typename T>
+class RealGatherer : public StatisticsGatherer
+{
+public:
+    explicit RealGatherer(const OptionalNoData& oNoData) : moNoData(oNoData) {}
+
+    void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride) override
+    {
+        const T* pFrom = reinterpret_cast<const T*>(pFirst);
+        for (std::uint64_t nDone = 0; nDone < nPixels; nDone += RUN)
+        {
+            const auto n = static_cast<std::size_t>(std::min<std::uint64_t>(RUN, nPixels - nDone));
+            const T* pRun = pFrom + nDone * nStride;
+            if (nStride == 1 && !moNoData.IsSet() && std::is_integral_v<T>)
+                moStatistics.Add(pRun, n);
+            else
+                moStatistics.Add(moValid.data(), Sift(pRun, n, nStride));
+        }
+    }
+
+    ChannelStatistics Get() const override
+    {
+        ChannelStatistics oResult = moCounts;
+        moStatistics.Report(oResult);
+        return oResult;
+    }
+
+private:
+    // Copies the valid values of a run to moValid and returns their number; counts the others.
+    std::size_t Sift(const T* pFrom, std::size_t n, unsigned int nStride)
+    {
+        if (!moNoData.IsSet() && std::is_integral_v<T>)
+        {
+            for (std::size_t i = 0; i < n; ++i)
+                moValid[i] = pFrom[i * nStride];
+            return n;
+        }
+        std::size_t nValid = 0, nNoData = 0;
+        for (std::size_t i = 0; i < n; ++i)
+        {
+            const T nValue = pFrom[i * nStride];
+            const bool bNoData = moNoData.Matches(nValue);
+            moValid[nValid] = nValue;
+            nNoData += bNoData ? 1 : 0;
+            if constexpr (std::is_floating_point_v<T>)
+                nValid += !bNoData && std::fabs(nValue) <= std::numeric_limits<T>::max() ? 1 : 0;
+            else
+                nValid += bNoData ? 0 : 1;
+        }
+        moCounts.noData += nNoData;
+        if (nValid + nNoData != n)
+            CountStrange(pFrom, n, nStride);
+        return nValid;
+    }
+
+    void CountStrange([[maybe_unused]] const T* pFrom, [[maybe_unused]] std::size_t n,
+                      [[maybe_unused]] unsigned int nStride)
+    {
+        if constexpr (std::is_floating_point_v<T>)
+        {
+            for (std::size_t i = 0; i < n; ++i)
+            {
+                const T nValue = pFrom[i * nStride];
+                if (moNoData.Matches(nValue) || std::isfinite(nValue))
+                    continue;
+                ++(std::isnan(nValue) ? moCounts.nan : moCounts.infinite);
+            }
+        }
+    }
+
+    NoDataMatch<T> moNoData;
+    ChannelStatistics moCounts;
+    RunStatistics<T> moStatistics;
+    std::array<T, RUN> moValid;
+};
+
+template <typename T>
+class ComplexGatherer : public StatisticsGatherer
+{
+public:
+    explicit ComplexGatherer(const OptionalNoData& oNoData) : moNoData(oNoData) {}
+
+    void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride) override
+    {
+        const T* pFrom = reinterpret_cast<const T*>(pFirst);
+        std::size_t nValid = 0;
+        for (std::uint64_t i = 0; i < nPixels; ++i)
+        {
+            const T nReal = pFrom[2 * i * nStride], nImaginary = pFrom[2 * i * nStride + 1];
+            const double nMagnitude = Magnitude(nReal, nImaginary);
+            if (moNoData.Matches(nReal, nImaginary))
+                ++moCounts.noData;
+            else if (std::isnan(static_cast<double>(nReal)) || std::isnan(static_cast<double>(nImaginary)))
+                ++moCounts.nan;
+            else if (!std::isfinite(nMagnitude))
+                ++moCounts.infinite;
+            else
+                moValid[nValid++] = nMagnitude;
+            if (nValid == RUN || i + 1 == nPixels)
+            {
+                moStatistics.Add(moValid.data(), nValid);
+                nValid = 0;
+            }
+        }
+    }
+
+    ChannelStatistics Get() const override
+    {
+        ChannelStatistics oResult = moCounts;
+        moStatistics.Report(oResult);
+        return oResult;
+    }
+
+private:
+    static double Magnitude(T nReal, T nImaginary)
+    {
+        const double nA = static_cast<double>(nReal), nB = static_cast<double>(nImaginary);
+        return std::is_same_v<T, double> ? std::hypot(nA, nB) : std::sqrt(nA * nA + nB * nB);
+    }
+
+    NoDataMatch<T> moNoData;
+    ChannelStatistics moCounts;
+    RunStatistics<double> moStatistics;
+    std::array<double, RUN> moValid;
+};
+
+} // namespace
+
+std::unique_ptr<StatisticsGatherer> StatisticsGatherer::Make(const krv::gobs::DataType& oType,
+                                                             const OptionalNoData& oNoData)
+{
+    return VisitPart(oType,
+                     [&](auto nZero) -> std::unique_ptr<StatisticsGatherer>
+                     {
+                         using Part = decltype(nZero);
+                         if (oType.IsComplex())
+                             return std::make_unique<ComplexGatherer<Part>>(oNoData);
+                         return std::make_unique<RealGatherer<Part>>(oNoData);
+                     });
+}
+
+std::vector<ChannelStatistics> ComputeStatistics(krv::datasources::IRasterReader& oReader,
+                                                 const std::vector<OptionalNoData>& oNoData, Progress& oProgress)
+{
+    const unsigned int nChannels = oReader.GetChansCount();
+    const auto nValueBytes = static_cast<std::size_t>(oReader.GetDataType().GetValueBits() / 8);
+    std::vector<std::unique_ptr<StatisticsGatherer>> oGatherers;
+    for (unsigned int c = 0; c < nChannels; ++c)
+        oGatherers.push_back(StatisticsGatherer::Make(oReader.GetDataType(), oNoData.at(c)));
+    oReader.SetMargins(0, 0, eMirror);
+    for (const std::unique_ptr<krv::gobs::Raster> poTile : krv::datasources::RasterRange(oReader))
+    {
+        const std::uint64_t nPixels = static_cast<std::uint64_t>(poTile->GetWidth()) * poTile->GetHeight();
+        for (unsigned int c = 0; c < nChannels; ++c)
+            oGatherers[c]->Add(poTile->GetBuffer() + c * nValueBytes, nPixels, nChannels);
+        oProgress.Advance(poTile->GetBufferSize());
+    }
+    std::vector<ChannelStatistics> oResults;
+    for (const auto& poGatherer : oGatherers)
+        oResults.push_back(poGatherer->Get());
+    return oResults;
+}
+
+} // namespace krv::tool

@@ -1,0 +1,76 @@
+#include "tools/krv/diagnosis.h"
+#include "tools/krv/errors.h"
+#include "tools/krv/jsontext.h"
+#include "tools/krv/verbs/verbs.h"
+
+#include <CLI/CLI.hpp>
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <memory>
+
+namespace krv::tool
+{
+
+namespace
+{
+
+std::string FindingText(const Finding& oFinding)
+{
+    std::string text = fmt::format("{}  {}: {}\n", oFinding.good ? "ok  " : "BAD ", OneLine(oFinding.subject),
+                                   OneLine(oFinding.found));
+    if (!oFinding.remedy.empty())
+        text += fmt::format("      what to do: {}\n", oFinding.remedy);
+    return text;
+}
+
+Json FindingToJson(const Finding& oFinding)
+{
+    return {{"ok", oFinding.good},
+            {"subject", oFinding.subject},
+            {"found", oFinding.found},
+            {"remedy", TextOrNull(oFinding.remedy)}};
+}
+
+int RunDoctor(const std::string& file, bool bJson)
+{
+    const InstallationCheck oInstallation;
+    std::vector<Finding> oFindings = oInstallation.GetFindings();
+    if (!file.empty())
+    {
+        const auto oMore = CheckFile(file, oInstallation.GetPlugins());
+        oFindings.insert(oFindings.end(), oMore.begin(), oMore.end());
+    }
+    Json oJson = Json::array();
+    std::string text;
+    for (const Finding& oFinding : oFindings)
+    {
+        oJson.push_back(FindingToJson(oFinding));
+        text += FindingText(oFinding);
+    }
+    Print(bJson ? ToText({{"findings", oJson}}) : text);
+    return std::all_of(oFindings.begin(), oFindings.end(), [](const Finding& oFinding) { return oFinding.good; }) ? 0
+                                                                                                                  : 1;
+}
+
+} // namespace
+
+void AddDoctorVerb(CLI::App& oApp, Selection& oSelection)
+{
+    auto* const poVerb = oApp.add_subcommand(
+        "doctor", "Checks the installation and each plug-in; for a FILE also why it does or does not open");
+    const auto poJson = std::make_shared<bool>(false);
+    poVerb->add_option("FILE", oSelection.file, "A file that should open");
+    poVerb->add_flag("--json", *poJson, "As JSON");
+    poVerb->footer("Exit code 1 when anything is wrong.");
+    poVerb->callback(
+        [&oSelection, poJson]
+        {
+            oSelection.run = [&oSelection, poJson]
+            {
+                return RunDoctor(oSelection.file, *poJson);
+            };
+        });
+}
+
+} // namespace krv::tool

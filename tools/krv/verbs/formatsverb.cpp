@@ -1,0 +1,83 @@
+#include "datasources/formatregistrar/winformatregistrar.h"
+#include "datasources/interfaces/ifileformat.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "datasources/iomanager/formatcapabilities.h"
+#include "tools/krv/jsontext.h"
+#include "tools/krv/verbs/verbs.h"
+
+#include <CLI/CLI.hpp>
+#include <fmt/format.h>
+
+#include <memory>
+
+namespace krv::tool
+{
+
+using namespace krv::datasources;
+
+namespace
+{
+
+constexpr std::pair<const char*, const char*> CAPABILITIES[] = {
+    {"create", CAPABILITY_CREATE},
+    {"metadata", CAPABILITY_METADATA},
+    {"georeferencing", CAPABILITY_GEOREFERENCING},
+    {"createBitmap", CAPABILITY_BITMAP_CREATE},
+    {"deleteBitmap", CAPABILITY_BITMAP_DELETE},
+    {"createControlPoint", CAPABILITY_CONTROL_POINT_CREATE},
+    {"deleteControlPoint", CAPABILITY_CONTROL_POINT_DELETE}};
+
+Json FormatToJson(const DatasetManager& oManager, const IFileFormat& oFormat)
+{
+    const FormatCapabilities& oCapabilities = oManager.GetCapabilities(oFormat.GetShortName());
+    Json oJson{{"name", oFormat.GetShortName()},
+               {"description", oFormat.GetDescription()},
+               {"extensions", oFormat.GetExtensions()},
+               {"capabilities", Json::object()}};
+    for (const auto& [pName, pXPath] : CAPABILITIES)
+        oJson["capabilities"][pName] = oCapabilities.IsSupported(pXPath);
+    return oJson;
+}
+
+std::string FormatText(const Json& oFormat)
+{
+    std::string can = "read";
+    for (const auto& [name, supported] : oFormat["capabilities"].items())
+        can += supported.get<bool>() ? ", " + name : "";
+    const auto oExtensions = oFormat["extensions"].get<std::vector<std::string>>();
+    return fmt::format("{:<10} {:<34} {:<24} {}\n", oFormat["name"].get<std::string>(),
+                       oFormat["description"].get<std::string>(), fmt::format("{}", fmt::join(oExtensions, " ")), can);
+}
+
+int RunFormats(bool bJson)
+{
+    const DatasetManager& oManager = *DatasetManager::GetInstance();
+    Json oJson{{"home", GetFormatHome()}, {"formats", Json::array()}};
+    std::string text = fmt::format("{:<10} {:<34} {:<24} {}\n", "NAME", "DESCRIPTION", "EXTENSIONS", "CAN");
+    for (const IFileFormat* const poFormat : oManager.GetFormatList())
+    {
+        oJson["formats"].push_back(FormatToJson(oManager, *poFormat));
+        text += FormatText(oJson["formats"].back());
+    }
+    Print(bJson ? ToText(oJson) : text);
+    return 0;
+}
+
+} // namespace
+
+void AddFormatsVerb(CLI::App& oApp, Selection& oSelection)
+{
+    auto* const poVerb = oApp.add_subcommand("formats", "Lists the formats: name, extensions, what each can do");
+    const auto poJson = std::make_shared<bool>(false);
+    poVerb->add_flag("--json", *poJson, "As JSON");
+    poVerb->callback(
+        [&oSelection, poJson]
+        {
+            oSelection.run = [poJson]
+            {
+                return RunFormats(*poJson);
+            };
+        });
+}
+
+} // namespace krv::tool

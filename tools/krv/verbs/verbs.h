@@ -1,0 +1,34 @@
+#pragma once
+
+#include <functional>
+#include <string>
+#include <vector>
+
+namespace CLI
+{
+class App;
+}
+
+namespace krv::tool
+{
+
+// What the arguments selected. Verbs fill it while they are parsed; Run does the work and returns the exit code.
+struct Selection
+{
+    std::function<int()> run;
+    std::string file; // the file that errors without a file name are about
+};
+
+// Each adds one verb to the command: its help, its options and what it does.
+void AddFormatsVerb(CLI::App& oApp, Selection& oSelection);
+void AddInfoVerb(CLI::App& oApp, Selection& oSelection);
+void AddChecksumVerb(CLI::App& oApp, Selection& oSelection);
+void AddStatsVerb(CLI::App& oApp, Selection& oSelection);
+void AddViewVerb(CLI::App& oApp, Selection& oSelection);
+void AddWalkVerb(CLI::App& oApp, Selection& oSelection);
+void AddDoctorVerb(CLI::App& oApp, Selection& oSelection);
+
+// "1,2,5" as numbers; an empty text is an empty list. Throws UsageError naming the option.
+std::vector<unsigned int> ParseNumbers(const std::string& text, const std::string& option);
+
+} // namespace krv::tool

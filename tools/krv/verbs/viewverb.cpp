@@ -1,0 +1,76 @@
+#include "toolkit/exceptions/exceptions.h"
+#include "tools/krv/jsontext.h"
+#include "tools/krv/quicklook.h"
+#include "tools/krv/sourcefile.h"
+#include "tools/krv/verbs/verbs.h"
+
+#include <CLI/CLI.hpp>
+#include <fmt/format.h>
+
+#include <filesystem>
+#include <map>
+#include <memory>
+#include <system_error>
+
+namespace krv::tool
+{
+
+namespace
+{
+
+struct Options
+{
+    std::string target;
+    std::string channels;
+    bool nearest = false;
+    QuickLookOptions look;
+};
+
+int RunView(const std::string& file, Options& oOptions)
+{
+    oOptions.look.channels = ParseNumbers(oOptions.channels, "--channels");
+    oOptions.look.average = !oOptions.nearest;
+    std::error_code oNone;
+    if (std::filesystem::equivalent(file, oOptions.target, oNone))
+        throw krv::DataException(oOptions.target + " is the file itself; name another for the quick look");
+    const SourceFile oFile(file);
+    const QuickLook oLook = MakeQuickLook(oFile, oOptions.look);
+    WritePng(oLook.picture, oOptions.target);
+    Print(fmt::format("{}: {} x {}, {}\n", oOptions.target, oLook.picture.width, oLook.picture.height,
+                      oLook.description));
+    return 0;
+}
+
+} // namespace
+
+void AddViewVerb(CLI::App& oApp, Selection& oSelection)
+{
+    auto* const poVerb = oApp.add_subcommand("view", "Makes a quick look as PNG, missing pixels transparent");
+    const auto poOptions = std::make_shared<Options>();
+    const std::map<std::string, StretchMode> oModes{{"auto", StretchMode::eAuto},
+                                                    {"none", StretchMode::eNone},
+                                                    {"percentile", StretchMode::ePercentile},
+                                                    {"minmax", StretchMode::eMinMax}};
+    poVerb->add_option("FILE", oSelection.file, "The file")->required();
+    poVerb->add_option("OUT", poOptions->target, "The PNG file to write; it is replaced")->required();
+    poVerb->add_option("--size", poOptions->look.size, "Longest side in pixels (1024); nothing is enlarged")
+        ->check(CLI::Range(1, 16384));
+    poVerb->add_option("--channels", poOptions->channels,
+                       "Three as red,green,blue or a single one; otherwise what the file says, else the first");
+    poVerb
+        ->add_option("--stretch", poOptions->look.stretch,
+                     "auto: 8-bit data of good contrast as it is, else percentile (the 2nd black, the 98th white); "
+                     "none: 0 to 255 as they are; minmax")
+        ->transform(CLI::CheckedTransformer(oModes, CLI::ignore_case));
+    poVerb->add_flag("--nearest", poOptions->nearest, "Take single pixels instead of means: for class numbers");
+    poVerb->callback(
+        [&oSelection, poOptions]
+        {
+            oSelection.run = [&oSelection, poOptions]
+            {
+                return RunView(oSelection.file, *poOptions);
+            };
+        });
+}
+
+} // namespace krv::tool
