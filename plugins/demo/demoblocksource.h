@@ -1,6 +1,6 @@
 #pragma once
 
-#include "plugins/support/file.h"
+#include "plugins/demo/demofile.h"
 #include "plugins/support/iblocksource.h"
 
 #include <memory>
@@ -12,17 +12,25 @@ namespace krv::plugins::demo
 class DemoBlockSource : public support::IBlockSource
 {
 public:
-    // nOffset: of the first pixel. Throws krv::FileFormatException when the file ends before the last one.
-    DemoBlockSource(std::unique_ptr<support::File> poFile, const support::ImageLayout& oLayout, std::uint64_t nOffset);
+    // Throws krv::FileFormatException when the file ends before the last pixel.
+    explicit DemoBlockSource(std::shared_ptr<DemoFile> poFile);
 
     const support::ImageLayout& GetLayout() const override { return moLayout; }
-    std::string GetName() const override { return mpoFile->GetName(); }
+    std::string GetName() const override { return mpoFile->GetFile().GetName(); }
     bool ReadsParts() const override { return true; }
     void ReadBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
                    std::size_t nPitch) override;
+    void WriteBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, const unsigned char* pSource,
+                    std::size_t nPitch) override;
 
 private:
-    std::unique_ptr<support::File> mpoFile;
+    static constexpr unsigned int BLOCK_SIZE = 256; // readers take it for their tiles
+
+    static support::ImageLayout MakeLayout(const DemoHeader& oHeader);
+    // Where the first pixel of a part lies in the file.
+    std::uint64_t OffsetOf(const support::BlockAddress& oBlock, const support::PixelRect& oPart) const;
+
+    std::shared_ptr<DemoFile> mpoFile;
     support::ImageLayout moLayout;
     std::vector<std::uint64_t> moOffsets; // of each plane
     support::Scratch moScratch;

@@ -1,6 +1,7 @@
 #include "datasources/interfaces/formatplugin.h"
 #include "plugins/demo/demodataset.h"
 #include "plugins/support/builder.h"
+#include "toolkit/exceptions/exceptions.h"
 
 namespace krv::plugins::demo
 {
@@ -13,14 +14,22 @@ public:
     krv::datasources::IDataset* Open(const std::string& fileName, AccessMode eMode) override
     {
         CheckReadOnly(fileName, eMode);
-        return new DemoDataset(fileName, GetFileFormat());
+        return new DemoDataset(fileName, GetFileFormat(), DemoDataset::Mode::eOpen);
     }
 
-    // By the first bytes alone: cheap, no file access, no side effects.
+    krv::datasources::IDataset* Create(const std::string& fileName, const std::string& options) override
+    {
+        if (options.find_first_not_of(' ') != std::string::npos)
+            throw krv::DataException(fileName + ": the format DEMO has no options, not " + options);
+        return new DemoDataset(fileName, GetFileFormat(), DemoDataset::Mode::eCreate);
+    }
+
+    // By the first bytes alone: cheap, no file access, no side effects. A file that was not written to its end is known
+    // too: Open says what is wrong with it.
     int Identify(const std::string&, const unsigned char* pHeader, unsigned int nHeaderLength, int) override
     {
         const std::string_view header(reinterpret_cast<const char*>(pHeader), nHeaderLength);
-        return header.starts_with(DemoDataset::SIGNATURE) ? 0 : 1;
+        return header.starts_with(DemoHeader::SIGNATURE) || header.starts_with(DemoHeader::UNFINISHED) ? 0 : 1;
     }
 };
 

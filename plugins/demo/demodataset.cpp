@@ -1,65 +1,102 @@
 #include "plugins/demo/demodataset.h"
 
-#include "gobs/raster/datatypeadapter.h"
 #include "plugins/demo/demoblocksource.h"
 #include "toolkit/exceptions/exceptions.h"
 
+#include <algorithm>
 #include <limits>
-#include <sstream>
 
 namespace krv::plugins::demo
 {
 
-namespace
+DemoDataset::DemoDataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat, Mode eMode)
+    : Dataset(fileName, poFormat), meMode(eMode)
 {
-
-support::Plane MakePlane(const std::string& type, const std::string& fileName)
-{
-    for (int nCode = krv::gobs::eDT_8U; nCode <= krv::gobs::eDT_C64R; ++nCode)
-    {
-        const auto eType = static_cast<krv::gobs::NativeDataTypeCode>(nCode);
-        if (krv::gobs::DataTypeAdapter::TypeToString(eType) == type)
-            return {eType, 1, {}};
-    }
-    throw krv::FileFormatException(fileName, fileName + " has channels of the unknown type " + type);
+    if (meMode == Mode::eOpen)
+        UseFile(std::make_shared<DemoFile>(fileName));
 }
 
-} // namespace
-
-DemoDataset::DemoDataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat)
-    : Dataset(fileName, poFormat)
+// I/O objects may keep the file a little longer.
+DemoDataset::~DemoDataset()
 {
-    auto oFile = std::make_unique<support::File>(fileName, support::File::Mode::eRead);
-    std::string header(MAX_HEADER_BYTES, '\0');
-    header.resize(oFile->ReadUpTo(0, header.data(), header.size()));
-    const std::size_t nEnd = header.find("\n\n");
-    if (!header.starts_with(SIGNATURE) || nEnd == std::string::npos)
-        throw krv::FileFormatException(fileName, fileName + " has no complete header");
+    if (mpoFile != nullptr)
+        mpoFile->Discard();
+}
 
-    std::istringstream oLines(header.substr(SIGNATURE.size(), nEnd - SIGNATURE.size() + 1));
-    oLines.imbue(std::locale::classic());
-    long long nWidth = 0; // every number from a file is hostile: read wide and signed, then checked
-    long long nHeight = 0;
-    std::string line;
-    std::getline(oLines >> nWidth >> nHeight >> std::ws, line);
-    if (std::min(nWidth, nHeight) < 1 || std::max(nWidth, nHeight) > std::numeric_limits<int>::max() || line.empty())
-        throw krv::FileFormatException(fileName, fileName + " has no valid image size or no channels");
+void DemoDataset::UseFile(std::shared_ptr<DemoFile> poFile)
+{
+    SetImage(std::make_unique<DemoBlockSource>(poFile));
+    mpoFile = std::move(poFile);
+}
 
-    std::vector<support::Plane> oPlanes;
-    std::istringstream oTypes(line);
-    for (std::string type; oTypes >> type;)
-        oPlanes.push_back(MakePlane(type, fileName));
-    for (std::string value; std::getline(std::getline(oLines, line, '='), value);)
-        moTags[line] = value;
-    SetImage(std::make_unique<DemoBlockSource>(
-        std::move(oFile), support::ImageLayout(nWidth, nHeight, BLOCK_SIZE, BLOCK_SIZE, oPlanes), nEnd + 2));
+void DemoDataset::Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes)
+{
+    CheckOpen();
+    if (meMode == Mode::eOpen || HasImage())
+        Refuse("an image exists already");
+    if (std::min(nWidth, nHeight) < 1 || std::max(nWidth, nHeight) > std::numeric_limits<int>::max() || oTypes.empty())
+        Refuse("an image of " + std::to_string(nWidth) + " x " + std::to_string(nHeight) + " pixels and " +
+               std::to_string(oTypes.size()) + " channels cannot be laid out");
+    for (const krv::gobs::DataType& oType : oTypes)
+        if (oType.GetNativeCode() == krv::gobs::eDT_BIT)
+            Refuse("channels of single bits cannot be stored");
+    UseFile(std::make_shared<DemoFile>(
+        GetFileName(), DemoHeader{nWidth, nHeight, oTypes,
+                                  krv::datasources::AuxiliaryData(static_cast<unsigned int>(oTypes.size()))}));
+}
+
+bool DemoDataset::Exists() const
+{
+    return meMode == Mode::eCreate ? mpoFile != nullptr : Dataset::Exists();
+}
+
+krv::datasources::FileAccessState DemoDataset::Delete()
+{
+    const bool bNamed = meMode == Mode::eOpen || (mpoFile != nullptr && mpoFile->IsNamed());
+    if (mpoFile != nullptr)
+        mpoFile->Discard();
+    if (bNamed)
+        return Dataset::Delete();
+    Close();
+    return krv::datasources::eDone;
 }
 
 krv::datasources::AuxiliaryData DemoDataset::ReadAuxiliaryData()
 {
-    krv::datasources::AuxiliaryData oData(GetChanCount());
-    oData.SetFileMetadata(moTags);
-    return oData;
+    static_cast<void>(GetImage());
+    return mpoFile->GetHeader().moTags;
+}
+
+void DemoDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData)
+{
+    if (!IsWritable())
+        return Dataset::WriteAuxiliaryData(oData);
+    if (oData.GetChannelCount() != GetChanCount())
+        Refuse("the metadata are those of " + std::to_string(oData.GetChannelCount()) + " channels, not of " +
+               std::to_string(GetChanCount()));
+    mpoFile->SetTags(oData);
+}
+
+void DemoDataset::Synchronize()
+{
+    CheckOpen();
+    if (IsWritable())
+        mpoFile->Finish();
+}
+
+void DemoDataset::Close()
+{
+    if (IsWritable())
+    {
+        mpoFile->Finish();
+        mpoFile->Discard();
+    }
+    Dataset::Close();
+}
+
+krv::datasources::AccessCapabilities DemoDataset::GetRasterCapabilities()
+{
+    return {true, meMode == Mode::eCreate, meMode == Mode::eCreate};
 }
 
 } // namespace krv::plugins::demo

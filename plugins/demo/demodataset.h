@@ -1,33 +1,43 @@
 #pragma once
 
 #include "datasources/metadata/auxiliarydata.h"
+#include "plugins/demo/demofile.h"
 #include "plugins/support/dataset.h"
-
-#include <string_view>
 
 namespace krv::plugins::demo
 {
 
-// A file of text lines and, after an empty line, pixels:
-//     DEMO1
-//     640 480          width and height
-//     8U 8U 32R        a data type for each channel
-//     key=value        any number of tags
-// Pixels are stored channel after channel, rows top to bottom, values little-endian without padding.
+// A header (DemoHeader) and pixels: channel after channel, rows top to bottom, values little-endian without padding.
+// A new file is there after Synchronize or Close; a dataset that is destroyed before leaves nothing behind.
 class DemoDataset : public support::Dataset
 {
 public:
-    static constexpr std::string_view SIGNATURE = "DEMO1\n";
+    enum class Mode
+    {
+        eOpen,
+        eCreate // the image is laid out by Create
+    };
 
-    // Throws krv::FileFormatException when the header is not as above or the file is shorter than it says.
-    DemoDataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat);
+    // Throws krv::FileFormatException when the header is not whole or the file is shorter than it says.
+    DemoDataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat, Mode eMode);
+    ~DemoDataset() override;
 
+    using support::Dataset::Create;
+    void Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes) override;
+    bool Exists() const override;
+    krv::datasources::FileAccessState Delete() override;
     krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
+    void WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override;
+    void Synchronize() override;
+    void Close() override;
+    krv::datasources::AccessCapabilities GetRasterCapabilities() override;
 
 private:
-    static constexpr std::size_t MAX_HEADER_BYTES = 65536;
-    static constexpr unsigned int BLOCK_SIZE = 256; // readers take it for their tiles
-    krv::datasources::MetadataMap moTags;
+    bool IsWritable() const { return mpoFile != nullptr && mpoFile->IsWritable(); }
+    void UseFile(std::shared_ptr<DemoFile> poFile);
+
+    std::shared_ptr<DemoFile> mpoFile; // null before Create
+    Mode meMode;
 };
 
 } // namespace krv::plugins::demo

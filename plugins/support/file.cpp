@@ -3,6 +3,7 @@
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
+#include <atomic>
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
@@ -56,6 +57,15 @@ std::string SystemErrorText(int nError)
 {
     char aText[256];
     return strerror_r(nError, aText, sizeof(aText));
+}
+
+std::string MakeTemporaryName(const std::string& fileName)
+{
+    static std::atomic<unsigned int> nCounter = 0;
+    const std::size_t nSlash = fileName.rfind('/');
+    const std::size_t nBegin = nSlash == std::string::npos ? 0 : nSlash + 1;
+    return fileName.substr(0, nBegin) + "." + fileName.substr(nBegin, 200) + "." + std::to_string(::getpid()) + "." +
+           std::to_string(nCounter++) + ".part";
 }
 
 File::File(const std::string& fileName, Mode eMode, const Place& oPlace) : moName(fileName), moPath(fileName)

@@ -73,6 +73,10 @@ private:
     std::uint64_t mnSize = 0;
 };
 
+// A name for what becomes fileName when it is whole: in the same folder, so that it can be renamed, of no length that a
+// folder does not take, and of this process alone.
+std::string MakeTemporaryName(const std::string& fileName);
+
 // The text of an error number, in the C locale.
 std::string SystemErrorText(int nError);
 

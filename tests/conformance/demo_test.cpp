@@ -1,12 +1,18 @@
 #include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/irasterio.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/basicreader.h"
 #include "gobs/raster/raster.h"
 #include "tests/conformance/conformance.h"
+#include "tests/support/recipe.h"
 #include "tests/support/tempfolder.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <gtest/gtest.h>
 
+#include <filesystem>
 #include <memory>
 
 using namespace krv::datasources;
@@ -48,6 +54,7 @@ TEST(DemoFormat, HeadersAreHostile)
         {"DEMO1\n5 2\n16U\nno tag\n\n" + pixels, ""},
         {"", "FILE has no complete header"},
         {"DEMO1\n5 4\n8U\n" + pixels, "FILE has no complete header"},
+        {"DEMO-\n5 4\n8U\n\n" + pixels, "FILE was not written to its end"},
         {"DEMO2\n5 4\n8U\n\n" + pixels, "FILE has no complete header"},
         {"DEMO1\n5 4\n8U\n" + std::string(70000, 'k') + "=v\n\n" + pixels, "FILE has no complete header"},
         {"DEMO1\n\n5 4\n8U\n" + pixels, SIZE},
@@ -80,4 +87,115 @@ TEST(DemoFormat, PixelsOfChannelsOfSeveralTypes)
     EXPECT_EQ(std::string(reinterpret_cast<const char*>(oWideTile->GetBuffer()), oWideTile->GetBufferSize()),
               "\3\4\5\6");
     EXPECT_THROW(BasicReader{file}, krv::DataException);
+}
+
+namespace
+{
+
+std::unique_ptr<IDataset> NewDemo(const std::string& file, const std::string& options = "")
+{
+    return std::unique_ptr<IDataset>(DatasetManager::GetInstance()->NewDataset(file, "DEMO", options));
+}
+
+IRasterDataset& Rasters(IDataset& oDataset)
+{
+    return dynamic_cast<IRasterDataset&>(oDataset);
+}
+
+void WriteChannel(IDataset& oDataset, unsigned int nChannel, const std::string& pixels)
+{
+    const std::unique_ptr<IRasterIO> oIO(Rasters(oDataset).GetRasterIO({nChannel}));
+    std::string copy = pixels;
+    oIO->WriteWindow(0u, 0u, oIO->GetFileWidth(), oIO->GetFileHeight(), reinterpret_cast<unsigned char*>(copy.data()));
+}
+
+std::string ReadChannel(const std::string& file, unsigned int nChannel)
+{
+    BasicReader oReader(file, {nChannel});
+    const std::unique_ptr<krv::gobs::Raster> oRaster(oReader.ReadRaster(0, 0, oReader.GetWidth(), oReader.GetHeight()));
+    return {reinterpret_cast<const char*>(oRaster->GetBuffer()), oRaster->GetBufferSize()};
+}
+
+long CountFiles(const krv::test::TempFolder& oFolder)
+{
+    const std::filesystem::directory_iterator oFiles(std::filesystem::path(oFolder.File("x")).parent_path());
+    return std::distance(begin(oFiles), end(oFiles));
+}
+
+} // namespace
+
+TEST(DemoFormat, NewFilesOfMixedTypesAreThereWhenTheyAreWhole)
+{
+    const krv::test::TempFolder oFolder;
+    const std::string file = oFolder.Write("new.demo", "something of old");
+    const std::vector<krv::gobs::DataType> TYPES = {krv::gobs::eDT_8U, krv::gobs::eDT_C16U, krv::gobs::eDT_64R};
+    AuxiliaryData oTags(3);
+    oTags.SetFileMetadata({{"scene", "line\nline\n\n100 %"}, {"[2]k=%41", "a=b"}, {"empty", ""}});
+    oTags.SetChanMetadata({{"NO_DATA_VALUE", "-1"}}, 3);
+    oTags.SetChannelDescription("[1]=red\r\n", 2);
+    const auto Lay = [&](IDataset& oDataset)
+    {
+        Rasters(oDataset).Create(300, 7, TYPES);
+        for (unsigned int nChannel = 1; nChannel <= 3; ++nChannel)
+            WriteChannel(oDataset, nChannel, krv::test::RecipeImage(300, 7, {nChannel}, TYPES[nChannel - 1]));
+        oDataset.WriteAuxiliaryData(oTags);
+    };
+    {
+        const auto oDropped = NewDemo(file);
+        EXPECT_FALSE(oDropped->Exists());
+        Lay(*oDropped);
+        EXPECT_TRUE(oDropped->Exists());
+        EXPECT_EQ(std::filesystem::file_size(file), 16u);
+        EXPECT_EQ(CountFiles(oFolder), 2);
+    }
+    EXPECT_EQ(CountFiles(oFolder), 1);
+    EXPECT_EQ(std::filesystem::file_size(file), 16u);
+    {
+        const auto oDataset = NewDemo(file);
+        Lay(*oDataset);
+        oDataset->Synchronize();
+        for (unsigned int nChannel = 1; nChannel <= 3; ++nChannel)
+            EXPECT_TRUE(ReadChannel(file, nChannel) == krv::test::RecipeImage(300, 7, {nChannel}, TYPES[nChannel - 1]));
+        // From here the file is marked until the next Synchronize.
+        WriteChannel(*oDataset, 1, std::string(2100, 'z'));
+        EXPECT_THROW(ReadChannel(file, 1), krv::FileFormatException);
+        oDataset->Close();
+    }
+    EXPECT_EQ(CountFiles(oFolder), 1);
+    EXPECT_EQ(ReadChannel(file, 1), std::string(2100, 'z'));
+    const AuxiliaryData oRead =
+        std::unique_ptr<IDataset>(DatasetManager::GetInstance()->Open(file, eReadOnly))->ReadAuxiliaryData();
+    EXPECT_EQ(oRead.GetFileMetadata(), oTags.GetFileMetadata());
+    EXPECT_EQ(oRead.GetChannelDescription(2), "[1]=red\r\n");
+    EXPECT_EQ(oRead.GetChanMetadataValue("NO_DATA_VALUE", 3), "-1");
+}
+
+TEST(DemoFormat, WhatCannotBeCreatedIsRefusedAndLeavesNothing)
+{
+    const krv::test::TempFolder oFolder;
+    const std::string file = oFolder.File("new.demo");
+    EXPECT_THROW(NewDemo(file, "COMPRESS=ZSTD"), krv::DataException);
+    const auto oDataset = NewDemo(file, " ");
+    IRasterDataset& oRasters = Rasters(*oDataset);
+    EXPECT_THROW(oRasters.GetWidth(), krv::DataException);
+    EXPECT_THROW(oRasters.Create(0, 5, {krv::gobs::eDT_8U}), krv::DataException);
+    EXPECT_THROW(oRasters.Create(5, 1u << 31, {krv::gobs::eDT_8U}), krv::DataException);
+    EXPECT_THROW(oRasters.Create(5, 5, {}), krv::DataException);
+    EXPECT_THROW(oRasters.Create(5, 5, {krv::gobs::eDT_BIT}), krv::DataException);
+    EXPECT_THROW(oRasters.Create(5, 5, {krv::gobs::DataType()}), krv::DataException);
+    EXPECT_THROW(oRasters.Create(5, 5, std::vector<krv::gobs::DataType>(30000, krv::gobs::eDT_8U)), krv::DataException);
+    EXPECT_THROW(oRasters.Create(INT32_MAX, INT32_MAX, {krv::gobs::eDT_C64R, krv::gobs::eDT_C64R}), krv::DataException);
+    EXPECT_EQ(CountFiles(oFolder), 0);
+    oRasters.Create(5, 5, {krv::gobs::eDT_8U});
+    EXPECT_THROW(oRasters.Create(5, 5, {krv::gobs::eDT_8U}), krv::DataException);
+    AuxiliaryData oTags(1);
+    oTags.SetFileMetadataValue("long", std::string(70000, 'k'));
+    EXPECT_THROW(oDataset->WriteAuxiliaryData(oTags), krv::DataException);
+    EXPECT_THROW(oDataset->WriteAuxiliaryData(AuxiliaryData(2)), krv::DataException);
+    const std::unique_ptr<IRasterIO> oIO(oRasters.GetRasterIO({1}));
+    oDataset->Close();
+    unsigned char oPixels[25] = {};
+    EXPECT_THROW(oIO->WriteWindow(0u, 0u, 5u, 5u, oPixels), krv::DataException);
+    EXPECT_EQ(ReadChannel(file, 1), std::string(25, '\0'));
+    EXPECT_THROW(DatasetManager::GetInstance()->Open(file, eUpdate), krv::DataException);
 }

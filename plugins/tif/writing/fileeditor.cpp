@@ -4,13 +4,11 @@
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
-#include <atomic>
 #include <cstdio>
 #include <unordered_set>
 #include <utility>
 
 #include <tiff.h>
-#include <unistd.h>
 
 namespace krv::plugins::tif
 {
@@ -38,16 +36,6 @@ bool IsOffsets(std::uint16_t nTag)
 bool IsCounts(std::uint16_t nTag)
 {
     return nTag == TIFFTAG_STRIPBYTECOUNTS || nTag == TIFFTAG_TILEBYTECOUNTS;
-}
-
-// In the folder of the file, so that it can be renamed, and of no length that a folder does not take.
-std::string MakeTemporaryName(const std::string& fileName)
-{
-    static std::atomic<unsigned int> nCounter = 0;
-    const std::size_t nSlash = fileName.rfind('/');
-    const std::size_t nBegin = nSlash == std::string::npos ? 0 : nSlash + 1;
-    return fileName.substr(0, nBegin) + "." + fileName.substr(nBegin, 200) + "." + std::to_string(::getpid()) + "." +
-           std::to_string(nCounter++) + ".part";
 }
 
 FileHeader ReadHeader(const support::File& oFile)
@@ -253,7 +241,7 @@ void FileEditor::LoadTags(PageModel& oPage)
 
 void FileEditor::CreateFile(bool bBigTiff, bool bGap)
 {
-    const std::string temporary = MakeTemporaryName(moFileName);
+    const std::string temporary = support::MakeTemporaryName(moFileName);
     mpoFile = std::make_shared<support::File>(temporary, support::File::Mode::eCreate);
     moTemporary = temporary;
     mpoFile->ShowAs(moFileName);
