@@ -7,8 +7,6 @@
 #include "toolkit/xml/xmlutil.h"
 
 #include <xalanc/PlatformSupport/XSLException.hpp>
-#include <xalanc/XPath/XPathEvaluator.hpp>
-#include <xalanc/XalanDOM/XalanDocument.hpp>
 #include <xalanc/XalanDOM/XalanNode.hpp>
 
 #include <charconv>
@@ -36,9 +34,7 @@ Answer Ask(const std::string& xmlPath, const std::string& xpath, Answer oOtherwi
     try
     {
         const krv::xml::Document oDocument = krv::xml::ParseFile(xmlPath);
-        xalanc::XPathEvaluator oEvaluator;
-        return oQuestion(
-            oEvaluator.selectSingleNode(oDocument.GetSupport(), oDocument.Get(), XmlTranscode(xpath).c_str()));
+        return oQuestion(SelectSingleNode(xpath, oDocument.Get()));
     }
     catch (const xalanc::XSLException& oException)
     {

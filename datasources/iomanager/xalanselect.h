@@ -17,7 +17,11 @@ class XalanNode;
 namespace krv::datasources
 {
 
-// Queries by XPath over a parsed document. Failures of the evaluation are the XML library's own exceptions.
+// Queries by XPath over a parsed document. Failures of the evaluation are the XML library's own exceptions; nothing is
+// printed.
+
+// The first selected node, null when none matches; it belongs to the document.
+KRV_DATASOURCES_API xalanc::XalanNode* SelectSingleNode(const std::string& xpath, xalanc::XalanDocument* poDocument);
 
 // The text of the first child of the first selected node, without surrounding white space; empty when no node matches.
 KRV_DATASOURCES_API std::string SelectNodeValue(const std::string& xpath, xalanc::XalanDocument* poDocument);
