@@ -29,9 +29,12 @@ namespace
 
 Json MapToJson(const MetadataMap& oMap)
 {
+    // The keys differ, so none is searched for: an ordered object would compare it with all before.
     Json oJson = Json::object();
+    auto& oEntries = oJson.get_ref<Json::object_t&>();
+    oEntries.reserve(oMap.size());
     for (const auto& [key, value] : oMap)
-        oJson[key] = value;
+        oEntries.emplace_back(key, value);
     return oJson;
 }
 
