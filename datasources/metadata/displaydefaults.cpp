@@ -14,9 +14,9 @@ namespace krv::datasources
 namespace
 {
 
-unsigned int GetDefault(IDataset& oDataset, const char* pKey)
+unsigned int GetDefault(const AuxiliaryData& oData, const char* pKey)
 {
-    std::istringstream oText(oDataset.ReadAuxiliaryData().GetFileMetadataValue(pKey));
+    std::istringstream oText(oData.GetFileMetadataValue(pKey));
     oText.imbue(std::locale::classic());
     unsigned int nChannel = 0;
     return oText >> nChannel ? nChannel : 0;
@@ -47,22 +47,42 @@ void SetReference(IDataset& oDataset, const char* pKey, unsigned int nChannel, c
 
 unsigned int GetDefaultRed(IDataset* poDataset)
 {
-    return GetDefault(*poDataset, detail::DEFAULT_RED);
+    return GetDefaultRed(poDataset->ReadAuxiliaryData());
 }
 
 unsigned int GetDefaultGreen(IDataset* poDataset)
 {
-    return GetDefault(*poDataset, detail::DEFAULT_GREEN);
+    return GetDefaultGreen(poDataset->ReadAuxiliaryData());
 }
 
 unsigned int GetDefaultBlue(IDataset* poDataset)
 {
-    return GetDefault(*poDataset, detail::DEFAULT_BLUE);
+    return GetDefaultBlue(poDataset->ReadAuxiliaryData());
 }
 
 unsigned int GetDefaultGrey(IDataset* poDataset)
 {
-    return GetDefault(*poDataset, detail::DEFAULT_GRAY);
+    return GetDefaultGrey(poDataset->ReadAuxiliaryData());
+}
+
+unsigned int GetDefaultRed(const AuxiliaryData& oData)
+{
+    return GetDefault(oData, detail::DEFAULT_RED);
+}
+
+unsigned int GetDefaultGreen(const AuxiliaryData& oData)
+{
+    return GetDefault(oData, detail::DEFAULT_GREEN);
+}
+
+unsigned int GetDefaultBlue(const AuxiliaryData& oData)
+{
+    return GetDefault(oData, detail::DEFAULT_BLUE);
+}
+
+unsigned int GetDefaultGrey(const AuxiliaryData& oData)
+{
+    return GetDefault(oData, detail::DEFAULT_GRAY);
 }
 
 void SetDefaultRed(IDataset* poDataset, unsigned int nChannel)

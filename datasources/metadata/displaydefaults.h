@@ -7,6 +7,7 @@
 namespace krv::datasources
 {
 
+class AuxiliaryData;
 class IDataset;
 
 // How a dataset is to be shown, kept in its metadata. Exceptions of the dataset's metadata operations pass. The dataset
@@ -19,6 +20,12 @@ KRV_DATASOURCES_API unsigned int GetDefaultRed(IDataset* poDataset);
 KRV_DATASOURCES_API unsigned int GetDefaultGreen(IDataset* poDataset);
 KRV_DATASOURCES_API unsigned int GetDefaultBlue(IDataset* poDataset);
 KRV_DATASOURCES_API unsigned int GetDefaultGrey(IDataset* poDataset);
+
+// The same from metadata that were read before.
+KRV_DATASOURCES_API unsigned int GetDefaultRed(const AuxiliaryData& oData);
+KRV_DATASOURCES_API unsigned int GetDefaultGreen(const AuxiliaryData& oData);
+KRV_DATASOURCES_API unsigned int GetDefaultBlue(const AuxiliaryData& oData);
+KRV_DATASOURCES_API unsigned int GetDefaultGrey(const AuxiliaryData& oData);
 
 KRV_DATASOURCES_API void SetDefaultRed(IDataset* poDataset, unsigned int nChannel);
 KRV_DATASOURCES_API void SetDefaultGreen(IDataset* poDataset, unsigned int nChannel);

@@ -4,6 +4,7 @@
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/metadata/displaydefaults.h"
+#include "datasources/metadata/referencetag.h"
 #include "gobs/raster/datatype.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/pixeltypes.h"
@@ -56,12 +57,12 @@ std::vector<unsigned int> IfAllThere(const SourceFile& oFile, const std::vector<
 
 bool UseDefaults(const SourceFile& oFile, DisplayChoice& oChoice)
 {
-    auto* const poDataset = &oFile.GetDataset();
+    const auto& oMetadata = oFile.GetMetadata();
     using namespace krv::datasources;
     oChoice.channels =
-        IfAllThere(oFile, {GetDefaultRed(poDataset), GetDefaultGreen(poDataset), GetDefaultBlue(poDataset)});
+        IfAllThere(oFile, {GetDefaultRed(oMetadata), GetDefaultGreen(oMetadata), GetDefaultBlue(oMetadata)});
     if (oChoice.channels.empty())
-        oChoice.channels = IfAllThere(oFile, {GetDefaultGrey(poDataset)});
+        oChoice.channels = IfAllThere(oFile, {GetDefaultGrey(oMetadata)});
     oChoice.reason = "the file's display defaults";
     return !oChoice.channels.empty();
 }
@@ -74,8 +75,10 @@ std::shared_ptr<krv::gobs::PCT> TableOf(const SourceFile& oFile, unsigned int nC
     const auto oList = poTables->GetPCTList();
     std::string file, layer;
     unsigned int nWanted = 0;
-    if (nChannel <= oFile.GetMetadata().GetChannelCount() &&
-        krv::datasources::GetDefaultPCT(&oFile.GetDataset(), nChannel, file, layer, nWanted) &&
+    const auto& oMetadata = oFile.GetMetadata();
+    if (nChannel <= oMetadata.GetChannelCount() &&
+        krv::datasources::ParseRefMetadataTag(oMetadata.GetChanMetadataValue("DEFAULT_PCT_REF", nChannel), file, layer,
+                                              nWanted) &&
         std::find(oList.begin(), oList.end(), nWanted) != oList.end())
         return std::shared_ptr<krv::gobs::PCT>(poTables->GetPCT(nWanted));
     for (const unsigned int nTable : oList)

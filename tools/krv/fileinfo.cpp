@@ -146,15 +146,15 @@ Json MathModelsToJson(const SourceFile& oFile)
 
 Json DisplayToJson(const SourceFile& oFile)
 {
-    IDataset* const poDataset = &oFile.GetDataset();
+    const AuxiliaryData& oMetadata = oFile.GetMetadata();
     const auto OrNull = [](unsigned int nChannel)
     {
         return nChannel != 0 ? Json(nChannel) : Json(nullptr);
     };
-    return {{"red", OrNull(GetDefaultRed(poDataset))},
-            {"green", OrNull(GetDefaultGreen(poDataset))},
-            {"blue", OrNull(GetDefaultBlue(poDataset))},
-            {"gray", OrNull(GetDefaultGrey(poDataset))}};
+    return {{"red", OrNull(GetDefaultRed(oMetadata))},
+            {"green", OrNull(GetDefaultGreen(oMetadata))},
+            {"blue", OrNull(GetDefaultBlue(oMetadata))},
+            {"gray", OrNull(GetDefaultGrey(oMetadata))}};
 }
 
 } // namespace
