@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <climits>
+#include <functional>
 
 namespace krv::plugins::tif
 {
@@ -113,7 +114,7 @@ bool PageForm::IsPremultiplied() const
 
 Page::Page(std::shared_ptr<const support::File> poFile, const FileHeader& oHeader, std::uint64_t nDirectory)
     : mpoFile(std::move(poFile)), moHeader(oHeader), moReader(*mpoFile), moDirectory(moReader, oHeader, nDirectory),
-      moHandle((CheckTagSizes(), moReader), oHeader, nDirectory)
+      moHandle(CheckDirectory(), oHeader, nDirectory)
 {
     ReadForm();
     ReadGeometry();
@@ -130,6 +131,13 @@ void Page::Fail(const std::string& what, const Place& oPlace) const
     throw FileFormatException(GetFileName(), GetFileName() + ": " + what, oPlace);
 }
 
+PeekReader& Page::CheckDirectory()
+{
+    CheckTagSizes();
+    CheckNumbers();
+    return moReader;
+}
+
 // libtiff reads every tag at once and bounds each alone only.
 void Page::CheckTagSizes() const
 {
@@ -143,6 +151,50 @@ void Page::CheckTagSizes() const
         }
     if (nSum > MAXIMUM_TAG_BYTES)
         Fail("the tags claim " + std::to_string(nSum) + " bytes");
+}
+
+// libtiff refuses these in words that tell a user nothing.
+void Page::CheckNumbers()
+{
+    const auto Number = [this](std::uint16_t nTag, std::uint64_t nDefault)
+    {
+        return moDirectory.GetNumber(moReader, nTag, nDefault);
+    };
+    if (moDirectory.Find(TIFFTAG_IMAGEWIDTH) == nullptr || moDirectory.Find(TIFFTAG_IMAGELENGTH) == nullptr)
+        Fail("the directory does not tell the image size");
+    const std::uint64_t nWidth = Number(TIFFTAG_IMAGEWIDTH, 1);
+    const std::uint64_t nTileWidth = Number(TIFFTAG_TILEWIDTH, 1);
+    CheckExtent("image", nWidth, Number(TIFFTAG_IMAGELENGTH, 1));
+    CheckExtent("tile", nTileWidth, Number(TIFFTAG_TILELENGTH, 1));
+    if (Number(TIFFTAG_ROWSPERSTRIP, 1) == 0)
+        Fail("its strips have no rows");
+    const std::uint64_t nChannels = Number(TIFFTAG_SAMPLESPERPIXEL, 1);
+    if (nChannels == 0 || nChannels > UINT16_MAX)
+        Fail("the image has " + std::to_string(nChannels) + " channels");
+    const auto oBits = moDirectory.GetNumbers(moReader, TIFFTAG_BITSPERSAMPLE, nChannels);
+    const auto oFormats = moDirectory.GetNumbers(moReader, TIFFTAG_SAMPLEFORMAT, nChannels);
+    for (const auto* poValues : {&oBits, &oFormats})
+        if (std::adjacent_find(poValues->begin(), poValues->end(), std::not_equal_to()) != poValues->end())
+            Fail("the channels differ in their type, which cannot be read");
+    const std::uint64_t nBits = oBits.empty() ? 1 : oBits.front();
+    if (nBits == 0 || nBits > UINT16_MAX)
+        Fail("samples of " + std::to_string(nBits) + " bits cannot be read");
+    const bool bSeparate = Number(TIFFTAG_PLANARCONFIG, PLANARCONFIG_CONTIG) == PLANARCONFIG_SEPARATE;
+    const bool bTiled = moDirectory.Find(TIFFTAG_TILEWIDTH) != nullptr;
+    CheckRow((bTiled ? nTileWidth : nWidth) * nBits / 8 * (bSeparate ? 1 : nChannels));
+}
+
+void Page::CheckExtent(const char* pWhat, std::uint64_t nWidth, std::uint64_t nHeight) const
+{
+    if (nWidth == 0 || nHeight == 0 || nWidth > INT_MAX || nHeight > INT_MAX)
+        Fail("the " + std::string(pWhat) + " size " + std::to_string(nWidth) + " x " + std::to_string(nHeight) +
+             " is out of range");
+}
+
+void Page::CheckRow(std::uint64_t nBytes) const
+{
+    if (nBytes > MAXIMUM_ROW_BYTES)
+        Fail("a row of " + std::to_string(nBytes) + " bytes is too long");
 }
 
 void Page::ReadForm()
@@ -161,8 +213,6 @@ void Page::ReadForm()
     std::uint16_t* pExtra = nullptr;
     if (TIFFGetField(poTiff, TIFFTAG_EXTRASAMPLES, &nExtra, &pExtra) == 1 && nExtra <= moForm.mnChannels)
         moForm.moExtraSamples.assign(pExtra, pExtra + nExtra);
-    if (moForm.mnChannels == 0)
-        Fail("the image has no channels");
     std::string reason;
     if (!FindSampleForm(GetTag<std::uint16_t>(poTiff, TIFFTAG_BITSPERSAMPLE, 1),
                         GetTag<std::uint16_t>(poTiff, TIFFTAG_SAMPLEFORMAT, SAMPLEFORMAT_UINT), moForm.moSample,
@@ -176,9 +226,7 @@ void Page::ReadGeometry()
     moForm.mnWidth = GetTag<std::uint32_t>(poTiff, TIFFTAG_IMAGEWIDTH, 0);
     moForm.mnHeight = GetTag<std::uint32_t>(poTiff, TIFFTAG_IMAGELENGTH, 0);
     moForm.mbTiled = TIFFIsTiled(poTiff) != 0;
-    if (moForm.mnWidth == 0 || moForm.mnHeight == 0 || moForm.mnWidth > INT_MAX || moForm.mnHeight > INT_MAX)
-        Fail("the image size " + std::to_string(moForm.mnWidth) + " x " + std::to_string(moForm.mnHeight) +
-             " is out of range");
+    CheckExtent("image", moForm.mnWidth, moForm.mnHeight);
     if (GetTag<std::uint32_t>(poTiff, TIFFTAG_IMAGEDEPTH, 1) > 1 ||
         GetTag<std::uint32_t>(poTiff, TIFFTAG_TILEDEPTH, 1) > 1)
         Fail("volumes (image depth above 1) cannot be read");
@@ -193,10 +241,7 @@ void Page::ReadGeometry()
         moForm.mnStrileHeight =
             std::min(moForm.mnHeight, GetTag<std::uint32_t>(poTiff, TIFFTAG_ROWSPERSTRIP, UINT32_MAX));
     }
-    if (moForm.mnStrileWidth == 0 || moForm.mnStrileHeight == 0 || moForm.mnStrileWidth > INT_MAX ||
-        moForm.mnStrileHeight > INT_MAX)
-        Fail("the size of its strips or tiles, " + std::to_string(moForm.mnStrileWidth) + " x " +
-             std::to_string(moForm.mnStrileHeight) + ", is out of range");
+    CheckExtent(moForm.mbTiled ? "tile" : "strip", moForm.mnStrileWidth, moForm.mnStrileHeight);
     moForm.mnStrilesAcross = DivideUp(moForm.mnWidth, moForm.mnStrileWidth);
     moForm.mnStrilesDown = DivideUp(moForm.mnHeight, moForm.mnStrileHeight);
 }
@@ -255,10 +300,7 @@ void Page::CheckPhotometric()
 void Page::CheckSizes() const
 {
     // The smallest part that is handled as a whole: a tile, or a row of a strip.
-    const std::uint64_t nRow =
-        std::max(moForm.GetRowBytes(moForm.mnStrileWidth), moForm.GetStoredRowBytes(moForm.mnStrileWidth));
-    if (nRow > MAXIMUM_ROW_BYTES)
-        Fail("a row of " + std::to_string(nRow) + " bytes is too long");
+    CheckRow(std::max(moForm.GetRowBytes(moForm.mnStrileWidth), moForm.GetStoredRowBytes(moForm.mnStrileWidth)));
     if (moForm.GetStriles() > UINT32_MAX)
         Fail("there are too many strips or tiles");
     if (moForm.mnCompression == COMPRESSION_NONE)

@@ -82,7 +82,11 @@ public:
     [[noreturn]] void Fail(const std::string& what, const Place& oPlace = Place::Current()) const;
 
 private:
+    PeekReader& CheckDirectory();
     void CheckTagSizes() const;
+    void CheckNumbers();
+    void CheckExtent(const char* pWhat, std::uint64_t nWidth, std::uint64_t nHeight) const;
+    void CheckRow(std::uint64_t nBytes) const;
     void ReadForm();
     void ReadGeometry();
     void CheckCodec();
