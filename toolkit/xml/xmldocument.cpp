@@ -50,6 +50,8 @@ public:
         XalanSourceTreeContentHandler::endElement(poUri, poLocalName, poName);
     }
 
+    void comment(const XMLCh* const, const XMLSize_t) override {}
+
     void startDTD(const XMLCh* const, const XMLCh* const, const XMLCh* const) override { moMeter.RefuseDocumentType(); }
 
 private:

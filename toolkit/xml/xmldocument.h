@@ -21,7 +21,7 @@ namespace krv::xml
 // XPaths are evaluated over it with xalanc::XPathEvaluator:
 //     xalanc::XPathEvaluator oEvaluator;
 //     XalanNode* poNode = oEvaluator.selectSingleNode(oDocument.GetSupport(), oDocument.Get(), xpath.c_str());
-// Nodes belong to the document. One thread at a time.
+// Nodes belong to the document; comments are left out. One thread at a time.
 class KRV_TOOLKIT_API Document
 {
 public:

@@ -91,7 +91,7 @@ TEST(FormatCapabilities, FailuresAreDebugOutputAndNo)
 TEST(XalanSelect, ValuesAreTrimmedAndNodesInOrder)
 {
     const krv::xml::XmlSession oSession;
-    const std::string text = "<a>\n <b>\t first\r\n </b><c>x</c><b/><b>second &#228;</b></a>";
+    const std::string text = "<a>\n <b><!-- none -->\t first\r\n </b><c>x</c><b/><b>second &#228;</b></a>";
     const krv::xml::Document oDocument = krv::xml::ParseMemory(text.data(), text.size(), "text");
     EXPECT_EQ(SelectNodeValue("/a/b", oDocument.Get()), "first");
     EXPECT_EQ(SelectNodeValue("/a/b[2]", oDocument.Get()), "");
