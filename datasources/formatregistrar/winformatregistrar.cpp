@@ -58,13 +58,6 @@ std::string WithSystemError(const std::string& message, int nError)
     return message + ", OS msg=" + "Unknown error." + ", OS errno=" + std::to_string(nError);
 }
 
-void* OpenFormatLibrary(const std::string& libraryFile)
-{
-    const std::string path = GetFormatHome() + "/lib/qrfformats/" + libraryFile;
-    const bool bInHome = libraryFile.find('/') == std::string::npos && krv::core::fileio::File(path).Exists();
-    return IMPOpenLibrary(bInHome ? path : libraryFile);
-}
-
 void* FindEntryPoint(void* pLibrary, const char* pSymbol, const char* pMessage, const std::string& libraryFile,
                      const Place& oPlace)
 {
@@ -114,6 +107,14 @@ std::string GetFormatLibraryFilename(const std::string& base, const std::string&
     return base + "." + extension;
 }
 
+std::string GetFormatLibraryPath(const std::string& libraryFile)
+{
+    const std::string inHome = GetFormatHome() + "/lib/qrfformats/" + libraryFile;
+    if (libraryFile.find('/') == std::string::npos)
+        return krv::core::fileio::File(inHome).Exists() ? inHome : libraryFile;
+    return libraryFile.starts_with('/') ? libraryFile : inHome;
+}
+
 void RegisterFormatLibraries(DatasetManager* poManager)
 {
     const std::string etc = EtcFolder(GetFormatHome());
@@ -132,7 +133,7 @@ void RegisterFormatLibraries(DatasetManager* poManager)
 
 void RegisterLibrary(const std::string& libraryFile, const std::string& xmlPath, DatasetManager* poManager)
 {
-    void* const pLibrary = OpenFormatLibrary(libraryFile);
+    void* const pLibrary = IMPOpenLibrary(GetFormatLibraryPath(libraryFile));
     if (pLibrary == nullptr)
     {
         const int nError = errno;

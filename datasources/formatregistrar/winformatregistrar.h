@@ -22,14 +22,17 @@ KRV_DATASOURCES_API std::string GetFormatRegistryFilename();
 // base + "." + extension
 KRV_DATASOURCES_API std::string GetFormatLibraryFilename(const std::string& base, const std::string& extension);
 
+// Where a plug-in library is loaded from: a name is looked for in lib/qrfformats of the home and then left to the
+// system's search path, a relative path counts from lib/qrfformats, an absolute one stays. Never the current folder.
+KRV_DATASOURCES_API std::string GetFormatLibraryPath(const std::string& libraryFile);
+
 // Reads the registry and registers the library of every format that it lists with the manager. The first failure ends
 // it and passes to the caller. Throws DataException when the registry lists nothing; a registry or description that is
 // missing or malformed throws the XML library's own exception.
 void RegisterFormatLibraries(DatasetManager* poManager);
 
 // Loads one library, checks its version and registers its builder. A library stays loaded until the process ends,
-// except one that lacks an entry point. libraryFile: a path, or a name that is looked for in lib/qrfformats of the home
-// and then on the system's search path.
+// except one that lacks an entry point. libraryFile: as for GetFormatLibraryPath.
 void RegisterLibrary(const std::string& libraryFile, const std::string& xmlPath, DatasetManager* poManager);
 
 } // namespace krv::datasources

@@ -133,10 +133,13 @@ void* IMPOpenLibrary(const std::string& fileName)
     void* pLibrary = dlopen(fileName.c_str(), RTLD_NOW | RTLD_LOCAL);
     if (pLibrary == nullptr)
     {
-        // The loader sets no error number: say whether the file is there at all.
+        // The loader sets no error number: say whether the file is there at all. Its text begins with the name as given
+        // when the search found nothing, else with the path that it found or with the name of another library.
+        NoteLibraryError(ENOENT);
         struct stat oStatus;
         const bool bPath = fileName.find('/') != std::string::npos;
-        NoteLibraryError(bPath && stat(fileName.c_str(), &oStatus) == 0 ? ENOEXEC : ENOENT);
+        if (bPath ? stat(fileName.c_str(), &oStatus) == 0 : !soLibraryError.starts_with(fileName + ": "))
+            errno = ENOEXEC;
     }
     return pLibrary;
 }

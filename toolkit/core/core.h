@@ -13,8 +13,9 @@ KRV_TOOLKIT_API std::string IMPGetEnv(const std::string& name);
 // The name under which the operating system knows a file. File names need no change on this platform.
 KRV_TOOLKIT_API std::string IMPMunge(const std::string& fileName);
 
-// Loads a shared library and returns its handle, or null with the system's last error number set. A name with a
-// separator is a path; other names are looked for on the system's search path. The library is never unloaded here.
+// Loads a shared library and returns its handle, or null with the system's last error number set: ENOENT when there is
+// no such library, ENOEXEC when it is there and cannot be loaded. A name with a separator is a path; other names are
+// looked for on the system's search path. The library is never unloaded here.
 KRV_TOOLKIT_API void* IMPOpenLibrary(const std::string& fileName);
 
 // The loader's own words on the last failure of IMPOpenLibrary or IMPFindSymbol in this thread; empty when none.

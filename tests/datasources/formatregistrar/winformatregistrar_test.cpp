@@ -7,6 +7,7 @@
 #include "gobs/raster/raster.h"
 #include "tests/support/formathome.h"
 #include "tests/support/outputcapture.h"
+#include "toolkit/core/core.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/xml/xmlerror.h"
 
@@ -14,6 +15,7 @@
 
 #include <dlfcn.h>
 
+#include <cerrno>
 #include <filesystem>
 
 using namespace krv::datasources;
@@ -224,8 +226,21 @@ TEST(FormatRegistrar, NamesAndHome)
     {
         const FormatHome oHome;
         EXPECT_EQ(GetFormatHome(), oHome.GetFolder().GetPath());
+        EXPECT_EQ(GetFormatLibraryPath("sub/a.so"), oHome.GetFolder().GetPath() + "/lib/qrfformats/sub/a.so");
+        EXPECT_EQ(GetFormatLibraryPath("/sub/a.so"), "/sub/a.so");
+        EXPECT_EQ(GetFormatLibraryPath("a.so"), "a.so");
         setenv("KRVHOME", "", 1);
         EXPECT_EQ(GetFormatHome(), std::filesystem::canonical(KRV_TEST_HOME).string());
+    }
+}
+
+// The search finds the script that compilers read, and the loader does not take it.
+TEST(FormatRegistrar, MissingAndUnusableLibrariesDifferInTheErrorNumber)
+{
+    for (const auto& [pName, nError] : {std::pair{"libm.so", ENOEXEC}, {"libnowhere.so", ENOENT}})
+    {
+        EXPECT_EQ(IMPOpenLibrary(pName), nullptr);
+        EXPECT_EQ(errno, nError) << pName << IMPLibraryError();
     }
 }
 
