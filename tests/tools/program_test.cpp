@@ -196,7 +196,7 @@ TEST(Command, WrongUsageIsTwo)
     EXPECT_EQ(RunKrv({}).code, 2);
     EXPECT_EQ(RunKrv({"explode"}).code, 2);
     EXPECT_EQ(RunKrv({"info"}).code, 2);
-    EXPECT_EQ(RunKrv({"info", "a", "--nonsense"}).code, 2);
+    ExpectFailure(RunKrv({"info", "a", "--non\x1bsense"}), 2, {"--non\\x1bsense"});
     EXPECT_EQ(RunKrv({"view", "a", "b", "--size", "0"}).code, 2);
     EXPECT_EQ(RunKrv({"--help"}).code, 0);
     EXPECT_EQ(RunKrv({"--version"}).code, 0);
@@ -240,8 +240,12 @@ TEST(Command, BrokenInstallationsAreDiagnosed)
     Expect({"availableformats.xml", "reinstall"}, "mend the XML");
     oHome.Write("etc/qrfformats/availableformats.xml", "<Formats/>");
     Expect({"availableformats.xml", "lists no format"}, "lists no format");
+    oHome.Write("etc/qrfformats/availableformats.xml", "<Formats><Format><!-- none --> </Format></Formats>");
+    Expect({"availableformats.xml", "an entry is empty"}, "an entry is empty");
     oHome.Write("etc/qrfformats/availableformats.xml", "<Formats><Format> x.xml </Format></Formats>");
     Expect({"x.xml"}, "description x.xml");
+    oHome.Write("etc/qrfformats/x.xml", "<Format><Object/></Format>");
+    Expect({"availableformats.xml", "names no library"}, "names no library");
     oHome.Write("etc/qrfformats/x.xml", "<Format><Object>nowhere</Object></Format>");
     Expect({"nowhere.so", "registry"}, "plug-in nowhere.so: does not load");
     oHome.Write("lib/qrfformats/nowhere.so", "no library at all");

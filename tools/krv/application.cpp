@@ -79,6 +79,8 @@ int RunApplication(int nArguments, char** pArguments)
     bool bVerbose = false;
     oApp.set_version_flag("--version", "krv " KRV_VERSION);
     oApp.add_flag("--verbose", bVerbose, "Errors also name the function, source file and line");
+    oApp.failure_message([](const CLI::App*, const CLI::Error& oError)
+                         { return "krv: " + OneLine(oError.what()) + "; `krv --help` explains\n"; });
     oApp.require_subcommand(1);
     oApp.fallthrough();
     AddFormatsVerb(oApp, oSelection);

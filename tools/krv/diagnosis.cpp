@@ -108,6 +108,9 @@ void InstallationCheck::CheckRegistry()
 
 void InstallationCheck::CheckDescription(const std::string& description)
 {
+    if (description.empty())
+        return Bad("registry " + moHome + "/etc/" + GetFormatRegistryFilename(), "an entry is empty",
+                   "name a description in <Format>, or take the entry out");
     const std::string path = moHome + "/etc/qrfformats/" + description;
     const std::string subject = "description " + description;
     const std::string why = WhyUnreadable(path);
@@ -133,8 +136,7 @@ void InstallationCheck::CheckPlugin(const std::string& object)
 {
     const std::string library = GetFormatLibraryFilename(object, "so");
     const std::string subject = "plug-in " + library;
-    const std::string inHome = moHome + "/lib/qrfformats/" + library;
-    const std::string path = std::filesystem::exists(inHome) ? inHome : library;
+    const std::string path = GetFormatLibraryPath(library);
     void* const pLibrary = IMPOpenLibrary(path);
     if (pLibrary == nullptr)
         return Bad(subject, "does not load: " + OneLine(IMPLibraryError()),
@@ -167,8 +169,8 @@ void InstallationCheck::CheckBuilder(const std::string& library, void* pLibrary)
     for (const LoadedPlugin& oOther : moPlugins)
     {
         if (oOther.name == name)
-            return Bad("plug-in " + library, "offers the format " + name + ", which another plug-in has already",
-                       "take one of the two out of the registry");
+            return Bad("plug-in " + library, "offers the format " + name + ", which an entry before it has already",
+                       "take one of the two entries out of the registry");
     }
     Good("plug-in " + library, fmt::format("loads; format {} ({})", name, poFormat->GetDescription()));
     moPlugins.push_back({name, std::move(poBuilder)});

@@ -11,9 +11,12 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
+#include <filesystem>
 #include <new>
+#include <string_view>
 #include <system_error>
 
 namespace krv::tool
@@ -21,6 +24,39 @@ namespace krv::tool
 
 namespace
 {
+
+constexpr std::size_t LONGEST_LINE = 1200;
+
+bool IsContinuation(char c)
+{
+    return (static_cast<unsigned char>(c) & 0xC0U) == 0x80U;
+}
+
+// How many bytes the first character of a text takes that a terminal can show and that leaves the terminal as it is; 0
+// for controls, marks that turn the direction of writing, and what is no UTF-8.
+std::size_t PrintableBytes(std::string_view text)
+{
+    const auto nLead = static_cast<unsigned char>(text.front());
+    if (nLead < 0x80)
+        return nLead >= 0x20 && nLead != 0x7F ? 1 : 0;
+    const std::size_t nBytes = nLead >= 0xF0 ? 4 : nLead >= 0xE0 ? 3 : 2;
+    if (nLead < 0xC2 || nLead > 0xF4 || text.size() < nBytes)
+        return 0;
+    char32_t nCode = nLead & (0x7FU >> nBytes);
+    for (const char c : text.substr(1, nBytes - 1))
+    {
+        if (!IsContinuation(c))
+            return 0;
+        nCode = nCode << 6U | (static_cast<unsigned char>(c) & 0x3FU);
+    }
+    const auto Within = [nCode](char32_t nFirst, char32_t nLast)
+    {
+        return nCode >= nFirst && nCode <= nLast;
+    };
+    const bool bTooLong = (nBytes == 3 && nCode < 0x800) || (nBytes == 4 && !Within(0x10000, 0x10FFFF));
+    const bool bControl = Within(0x80, 0x9F) || Within(0x2028, 0x202E) || Within(0x2066, 0x2069);
+    return bTooLong || bControl || Within(0xD800, 0xDFFF) ? 0 : nBytes;
+}
 
 std::string RegistryPath()
 {
@@ -50,8 +86,13 @@ std::string FormatText(const krv::FileFormatException& oError)
 
 std::string LibraryText(const krv::LibraryException& oError)
 {
+    if (oError.GetLibraryFile() == krv::datasources::GetFormatLibraryFilename("", "so"))
+        return fmt::format("{}: a description listed there names no library; add <Object>name</Object> to it, or take "
+                           "it out of the registry (`krv doctor` tells which)",
+                           RegistryPath());
     const char* pRemedy = "reinstall it; the registry is";
-    if (oError.GetType() == krv::LibraryException::eLibraryNotFound)
+    if (oError.GetType() == krv::LibraryException::eLibraryNotFound &&
+        oError.GetMessage().ends_with("=" + std::to_string(ENOENT)))
         pRemedy = "install what is missing, or take its description out of the registry";
     if (oError.GetType() == krv::LibraryException::eVersionMismatch)
         pRemedy = "install the plug-in of this version, or take its description out of the registry";
@@ -64,6 +105,10 @@ std::string DataText(const krv::Exception& oError, const std::string& file)
 {
     if (oError.GetMessage() == "No format libraries registered successfully")
         return fmt::format("{}: the registry lists no format; reinstall, or list the formats in it", RegistryPath());
+    constexpr std::string_view TWICE = "Format already registered: short name=";
+    if (oError.GetMessage().starts_with(TWICE))
+        return fmt::format("{}: the format {} is listed twice; take one of the two out of the registry", RegistryPath(),
+                           oError.GetMessage().substr(TWICE.size()));
     return WithFile(file, oError.GetMessage().empty() ? "it failed without saying why" : oError.GetMessage());
 }
 
@@ -74,6 +119,9 @@ std::string IoText(const krv::IOException& oError)
 
 std::string XmlText(const std::string& message)
 {
+    const std::string folder = std::filesystem::path(RegistryPath()).parent_path().string() + "/";
+    if (message.starts_with(folder + ":"))
+        return fmt::format("{}: an entry is empty; name a description in it, or take it out", RegistryPath());
     return fmt::format("{}; mend or reinstall that file, or set KRVHOME to another installation (`krv doctor` checks "
                        "all)",
                        message);
@@ -161,13 +209,26 @@ std::string CurrentMessage()
 
 std::string OneLine(const std::string& text)
 {
-    std::string line = text;
-    for (char& c : line)
+    std::string line;
+    for (std::string_view rest = text; !rest.empty();)
     {
-        if (static_cast<unsigned char>(c) < 0x20 || c == 0x7F)
-            c = ' ';
+        const std::size_t nBytes = PrintableBytes(rest);
+        const char c = rest.front();
+        if (nBytes > 0)
+            line += rest.substr(0, nBytes);
+        else
+            line += c == '\n' || c == '\r' || c == '\t' ? " " : fmt::format("\\x{:02x}", static_cast<unsigned char>(c));
+        rest.remove_prefix(std::max<std::size_t>(nBytes, 1));
     }
-    return line;
+    if (line.size() <= LONGEST_LINE)
+        return line;
+    std::size_t nHead = LONGEST_LINE * 2 / 3;
+    std::size_t nTail = line.size() - LONGEST_LINE / 3;
+    while (IsContinuation(line[nHead]))
+        --nHead;
+    while (IsContinuation(line[nTail]))
+        ++nTail;
+    return line.substr(0, nHead) + " ... " + line.substr(nTail);
 }
 
 std::string WhyUnreadable(const std::string& file)

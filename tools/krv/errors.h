@@ -21,7 +21,8 @@ std::string DescribeError(const std::string& file, bool bVerbose);
 // What the exception that is being handled says by itself, on one line, whatever its kind.
 std::string CurrentMessage();
 
-// The text with line breaks and other control characters turned into blanks.
+// The text as a terminal may show it: line breaks and tabs are blanks, other controls and bytes that are no UTF-8 are
+// written as \\x1b, and of a very long text the middle is left out.
 std::string OneLine(const std::string& text);
 
 // Why a file cannot be opened, from the operating system: "there is no such file", "it is a folder", ... ; empty when

@@ -2,13 +2,18 @@
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/iomanager/formatcapabilities.h"
+#include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
 #include <fmt/format.h>
 
+#include <algorithm>
+#include <array>
 #include <memory>
+#include <string>
+#include <vector>
 
 namespace krv::tool
 {
@@ -39,27 +44,43 @@ Json FormatToJson(const DatasetManager& oManager, const IFileFormat& oFormat)
     return oJson;
 }
 
-std::string FormatText(const Json& oFormat)
+using Row = std::array<std::string, 4>;
+
+Row FormatRow(const Json& oFormat)
 {
     std::string can = "read";
     for (const auto& [name, supported] : oFormat["capabilities"].items())
         can += supported.get<bool>() ? ", " + name : "";
     const auto oExtensions = oFormat["extensions"].get<std::vector<std::string>>();
-    return fmt::format("{:<10} {:<34} {:<24} {}\n", oFormat["name"].get<std::string>(),
-                       oFormat["description"].get<std::string>(), fmt::format("{}", fmt::join(oExtensions, " ")), can);
+    return {OneLine(oFormat["name"].get<std::string>()), OneLine(oFormat["description"].get<std::string>()),
+            OneLine(fmt::format("{}", fmt::join(oExtensions, " "))), can};
+}
+
+// Columns as wide as their longest text.
+std::string TableText(const std::vector<Row>& oRows)
+{
+    std::array<std::size_t, 3> aWidths{};
+    for (const Row& oRow : oRows)
+        for (std::size_t i = 0; i < aWidths.size(); ++i)
+            aWidths[i] = std::max(aWidths[i], oRow[i].size());
+    std::string text;
+    for (const Row& oRow : oRows)
+        text += fmt::format("{:<{}}  {:<{}}  {:<{}}  {}\n", oRow[0], aWidths[0], oRow[1], aWidths[1], oRow[2],
+                            aWidths[2], oRow[3]);
+    return text;
 }
 
 int RunFormats(bool bJson)
 {
     const DatasetManager& oManager = *DatasetManager::GetInstance();
     Json oJson{{"home", GetFormatHome()}, {"formats", Json::array()}};
-    std::string text = fmt::format("{:<10} {:<34} {:<24} {}\n", "NAME", "DESCRIPTION", "EXTENSIONS", "CAN");
+    std::vector<Row> oRows{{"NAME", "DESCRIPTION", "EXTENSIONS", "CAN"}};
     for (const IFileFormat* const poFormat : oManager.GetFormatList())
     {
         oJson["formats"].push_back(FormatToJson(oManager, *poFormat));
-        text += FormatText(oJson["formats"].back());
+        oRows.push_back(FormatRow(oJson["formats"].back()));
     }
-    Print(bJson ? ToText(oJson) : text);
+    Print(bJson ? ToText(oJson) : TableText(oRows));
     return 0;
 }
 
