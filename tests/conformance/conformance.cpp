@@ -24,9 +24,9 @@
 #include <dlfcn.h>
 
 #include <algorithm>
-#include <chrono>
 #include <cmath>
 #include <cstring>
+#include <ctime>
 #include <filesystem>
 #include <fstream>
 #include <future>
@@ -352,7 +352,7 @@ void ReadWhatThereIs(const Plugin& oPlugin, const std::string& file)
 void TryDamaged(const Plugin& oPlugin, const std::string& file, const std::string& what, Findings& oFindings)
 {
     const std::uint64_t nMemory = PeakMemory();
-    const auto oStart = std::chrono::steady_clock::now();
+    const std::clock_t nStart = std::clock();
     try
     {
         ReadWhatThereIs(oPlugin, file);
@@ -361,9 +361,12 @@ void TryDamaged(const Plugin& oPlugin, const std::string& file, const std::strin
     {
         oFindings.push_back(what + ": " + DescribeException());
     }
-    const std::chrono::duration<double> oTime = std::chrono::steady_clock::now() - oStart;
-    Expect(oFindings, oTime.count() < MAX_SECONDS, what, ": takes ", oTime.count(), " s");
-    Expect(oFindings, PeakMemory() - nMemory < MAX_MEMORY, what, ": takes more than ", MAX_MEMORY >> 20, " MiB");
+    // Of the processor: a busy machine is no fault of the plug-in.
+    const double dSeconds = static_cast<double>(std::clock() - nStart) / CLOCKS_PER_SEC;
+    Expect(oFindings, dSeconds < MAX_SECONDS, what, ": takes ", dSeconds, " s");
+    // Not the difference: the kernel counts pages by processor, and the peak that it tells may even sink a little.
+    const std::uint64_t nPeak = PeakMemory();
+    Expect(oFindings, nPeak < nMemory + MAX_MEMORY, what, ": takes ", (nPeak - nMemory) >> 20, " MiB");
 }
 
 void CheckTruncated(const Plugin& oPlugin, const std::string& sample, Findings& oFindings)
