@@ -22,6 +22,7 @@ constexpr char FOOTER[] = "Examples:\n"
                           "  krv info scene.tif                     everything known of a file\n"
                           "  krv stats scene.tif --json             statistics per channel, for other programs\n"
                           "  krv view scene.tif look.png --size 800 a quick look\n"
+                          "  krv convert scene.tif copy.tif --options COMPRESS=ZSTD\n"
                           "  krv doctor scene.tif                   why a file does or does not open\n"
                           "`krv VERB --help` explains a verb. Exit code: 0 done, 1 failed, 2 wrong usage.\n"
                           "Formats are found below the folder that KRVHOME names, else beside the library.";
@@ -74,7 +75,7 @@ int RunVerb(const Selection& oSelection, bool bVerbose)
 
 int RunApplication(int nArguments, char** pArguments)
 {
-    CLI::App oApp("Reads raster files of every format that has a plug-in.", "krv");
+    CLI::App oApp("Reads and writes raster files of every format that has a plug-in.", "krv");
     Selection oSelection;
     bool bVerbose = false;
     oApp.set_version_flag("--version", "krv " KRV_VERSION);
@@ -89,6 +90,7 @@ int RunApplication(int nArguments, char** pArguments)
     AddStatsVerb(oApp, oSelection);
     AddViewVerb(oApp, oSelection);
     AddWalkVerb(oApp, oSelection);
+    AddConvertVerb(oApp, oSelection);
     AddDoctorVerb(oApp, oSelection);
     oApp.footer(FOOTER); // after the verbs, which would take it over
     try

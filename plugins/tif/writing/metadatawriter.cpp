@@ -3,11 +3,13 @@
 #include "plugins/tif/metadata.h"
 #include "toolkit/exceptions/exceptions.h"
 
+#include <algorithm>
 #include <array>
 #include <charconv>
 #include <cmath>
 #include <optional>
 #include <sstream>
+#include <string_view>
 #include <vector>
 
 #include <tiff.h>
@@ -287,8 +289,83 @@ bool MetadataWriter::StoreAlpha(unsigned int nChannel, const std::string& colour
     return colour == "Alpha" && bKnownKind;
 }
 
+// The colours that the record names, as the tags say them that other programs show an image by. Pixels stay as they
+// are: only how many channels count as colours changes.
+void MetadataWriter::StoreColourModel(const AuxiliaryData& oNew)
+{
+    struct Model
+    {
+        std::string_view moPhotometric;
+        std::string_view moFirst;
+        std::uint16_t mnCode;
+        std::size_t mnColours;
+    };
+    constexpr Model MODELS[] = {{"", "Red", PHOTOMETRIC_RGB, 3},
+                                {"", "Gray", PHOTOMETRIC_MINISBLACK, 1},
+                                {"MinIsWhite", "Gray", PHOTOMETRIC_MINISWHITE, 1},
+                                {"Separated", "", PHOTOMETRIC_SEPARATED, 4},
+                                {"CIELab", "", PHOTOMETRIC_CIELAB, 3},
+                                {"ICCLab", "", PHOTOMETRIC_ICCLAB, 3},
+                                {"ITULab", "", PHOTOMETRIC_ITULAB, 3}};
+    TagList& oTags = mpoPage->moTags;
+    const std::uint64_t nOld = oTags.GetNumber(TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
+    const std::size_t nChannels = oNew.GetChannelCount();
+    const std::vector<std::uint64_t> oOldExtra = oTags.GetNumbers(TIFFTAG_EXTRASAMPLES);
+    const bool bPlain = oTags.GetNumber(TIFFTAG_COMPRESSION, COMPRESSION_NONE) != COMPRESSION_JPEG &&
+                        oTags.Find(TIFFTAG_COLORMAP) == nullptr && nOld <= PHOTOMETRIC_RGB &&
+                        oOldExtra.size() < nChannels;
+    const auto Colour = [&oNew, nChannels](unsigned int nChannel)
+    {
+        return nChannel <= nChannels ? oNew.GetChanMetadataValue("ColorInterp", nChannel) : std::string();
+    };
+    for (const Model& oModel : MODELS)
+    {
+        const bool bMeant = oNew.GetFileMetadataValue("Photometric") == oModel.moPhotometric &&
+                            Colour(1) == oModel.moFirst && nChannels >= oModel.mnColours;
+        if (!bPlain || !bMeant || nOld == oModel.mnCode)
+            continue;
+        if (oModel.mnCode == PHOTOMETRIC_RGB && (Colour(2) != "Green" || Colour(3) != "Blue"))
+            continue;
+        std::vector<std::uint64_t> oExtra(nChannels - oModel.mnColours, EXTRASAMPLE_UNSPECIFIED);
+        const std::size_t nKept = std::min(oExtra.size(), oOldExtra.size());
+        std::copy(oOldExtra.end() - static_cast<std::ptrdiff_t>(nKept), oOldExtra.end(),
+                  oExtra.end() - static_cast<std::ptrdiff_t>(nKept));
+        oTags.SetNumber(TIFFTAG_PHOTOMETRIC, TIFF_SHORT, oModel.mnCode);
+        if (oExtra.empty())
+            oTags.Remove(TIFFTAG_EXTRASAMPLES);
+        else
+            oTags.SetNumbers(TIFFTAG_EXTRASAMPLES, TIFF_SHORT, oExtra);
+        break;
+    }
+}
+
+// What the tags say by themselves now needs no item.
+void MetadataWriter::NoteColours(const AuxiliaryData& oNew)
+{
+    const AuxiliaryData oSaid = ReadMetadata(*moEditor.OpenPage(mpoPage));
+    for (const MetadataKey& oKey : moChanged)
+    {
+        const auto& [nChannel, key] = oKey;
+        if (nChannel == 0 && key == "Photometric" && oSaid.GetFileMetadataValue(key) == oNew.GetFileMetadataValue(key))
+            moElsewhere.insert(oKey);
+        if (nChannel != 0 && key == "ColorInterp" &&
+            oSaid.GetChanMetadataValue(key, nChannel) == oNew.GetChanMetadataValue(key, nChannel))
+            moElsewhere.insert(oKey);
+    }
+}
+
 void MetadataWriter::StoreColours(const AuxiliaryData& oNew)
 {
+    const bool bColours = std::any_of(moChanged.begin(), moChanged.end(),
+                                      [](const MetadataKey& oKey)
+                                      { return oKey.second == "ColorInterp" || oKey.second == "Photometric"; });
+    if (bColours)
+    {
+        const std::uint64_t nOld = mpoPage->moTags.GetNumber(TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
+        StoreColourModel(oNew);
+        if (nOld != mpoPage->moTags.GetNumber(TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK))
+            NoteColours(oNew);
+    }
     for (unsigned int nChannel = 1; nChannel <= oNew.GetChannelCount(); ++nChannel)
     {
         const MetadataKey oColour{nChannel, "ColorInterp"};

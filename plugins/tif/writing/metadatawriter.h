@@ -40,6 +40,8 @@ private:
     bool StoreRpc(const std::string& value);
     bool StorePoints(const std::string& value);
     bool StoreAlpha(unsigned int nChannel, const std::string& colour, const std::string& kind);
+    void StoreColourModel(const krv::datasources::AuxiliaryData& oNew);
+    void NoteColours(const krv::datasources::AuxiliaryData& oNew);
     void StoreColours(const krv::datasources::AuxiliaryData& oNew);
     void StoreItems(const krv::datasources::AuxiliaryData& oNew);
 

@@ -1,0 +1,312 @@
+#include "tools/krv/conversion.h"
+
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/ifileformat.h"
+#include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "datasources/iomanager/formatcapabilities.h"
+#include "datasources/reader/basicreader.h"
+#include "datasources/writer/basicwriter.h"
+#include "gobs/pct/pct.h"
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/warning.h"
+#include "toolkit/ogc/cs/icrs.h"
+#include "tools/krv/copypixels.h"
+#include "tools/krv/copyrecord.h"
+#include "tools/krv/errors.h"
+#include "tools/krv/progress.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <cctype>
+#include <filesystem>
+#include <memory>
+#include <system_error>
+
+namespace krv::tool
+{
+
+using namespace krv::datasources;
+
+namespace
+{
+
+void Warn(const std::string& message)
+{
+    krv::nspio::Warning::Warn(message, "tools/krv/conversion", 0);
+}
+
+void CheckTarget(const CopyRequest& oRequest, const std::string& target)
+{
+    std::error_code oNone;
+    for (const std::string& source : oRequest.sources)
+    {
+        if (std::filesystem::equivalent(source, target, oNone))
+            throw krv::DataException(target + " is the file itself; name another for the copy");
+    }
+    if (std::filesystem::exists(target, oNone) && !std::filesystem::is_regular_file(target, oNone))
+        throw krv::DataException(target + " is there and no plain file; name another for the copy");
+}
+
+bool EqualNames(const std::string& first, const std::string& second)
+{
+    return std::equal(first.begin(), first.end(), second.begin(), second.end(),
+                      [](unsigned char a, unsigned char b) { return std::tolower(a) == std::tolower(b); });
+}
+
+// By the extension of the file's name when the user names no format.
+std::string ChooseFormat(const TargetForm& oForm)
+{
+    const DatasetManager& oManager = *DatasetManager::GetInstance();
+    const std::string extension = std::filesystem::path(oForm.name).extension().string();
+    std::string format = "TIF";
+    std::string all;
+    bool bKnown = oForm.format.empty();
+    for (const IFileFormat* const poFormat : oManager.GetFormatList())
+    {
+        for (const std::string& own : poFormat->GetExtensions())
+        {
+            if (oForm.format.empty() && EqualNames("." + own, extension))
+                format = poFormat->GetShortName();
+        }
+        bKnown = bKnown || EqualNames(poFormat->GetShortName(), oForm.format);
+        all += (all.empty() ? "" : ", ") + poFormat->GetShortName();
+    }
+    if (!bKnown)
+        throw UsageError(fmt::format("--format: there is no format {}; there are {}", oForm.format, all));
+    if (!oForm.format.empty())
+    {
+        format = oForm.format;
+        std::transform(format.begin(), format.end(), format.begin(), [](unsigned char c) { return std::toupper(c); });
+    }
+    if (!oManager.GetCapabilities(format).IsSupported(CAPABILITY_CREATE))
+        throw krv::DataException(fmt::format("{}: the format {} cannot create files", oForm.name, format));
+    return format;
+}
+
+// The new file while it is being made. What is not finished goes with it.
+class Target
+{
+public:
+    Target(const CopyPlan& oPlan, const TargetForm& oForm)
+        : moName(oForm.name),
+          mpoDataset(DatasetManager::GetInstance()->NewDataset(moName, ChooseFormat(oForm), oForm.options)),
+          mpoRaster(dynamic_cast<IRasterDataset*>(mpoDataset.get()))
+    {
+        if (mpoRaster == nullptr)
+            throw krv::DataException(moName + ": the format does not hold images");
+        const auto oTypes = oPlan.GetTypes();
+        try
+        {
+            mpoRaster->Create(oPlan.GetWindow().width, oPlan.GetWindow().height, oTypes);
+        }
+        catch (const krv::DataException& oError)
+        {
+            if (std::all_of(oTypes.begin(), oTypes.end(), [&](const auto& oType) { return oType == oTypes.front(); }))
+                throw;
+            throw krv::DataException(oError.GetMessage() + " (--type gives all channels one type)");
+        }
+    }
+
+    template <typename Facet>
+    Facet* Find() const
+    {
+        return dynamic_cast<Facet*>(mpoDataset.get());
+    }
+    IDataset& Get() const { return *mpoDataset; }
+    IRasterDataset& GetRaster() const { return *mpoRaster; }
+    const std::string& GetName() const { return moName; }
+
+    // What this format cannot keep is told, not taken for a failure: the pixels are the copy.
+    template <typename Action>
+    void Try(const std::string& what, Action oAction) const
+    {
+        try
+        {
+            oAction();
+        }
+        catch (const krv::DataException& oError)
+        {
+            Warn(fmt::format("{} is not kept: {}", what, oError.GetMessage()));
+        }
+    }
+
+private:
+    std::string moName;
+    std::unique_ptr<IDataset> mpoDataset;
+    IRasterDataset* mpoRaster;
+};
+
+std::string Of(const CopyPlan& oPlan, std::size_t nSource, const std::string& what)
+{
+    return oPlan.GetSource(nSource).GetName() + ": " + what;
+}
+
+// The tables of the copied channels, each once.
+TableNumbers CopyTables(const CopyPlan& oPlan, const Target& oTarget)
+{
+    TableNumbers oNumbers;
+    unsigned int nPosition = 0;
+    for (const CopiedChannel& oChannel : oPlan.GetChannels())
+    {
+        ++nPosition;
+        auto* const poFrom = dynamic_cast<IPCTDataset*>(&oPlan.GetSource(oChannel.source).GetDataset());
+        for (const unsigned int nTable : poFrom != nullptr ? poFrom->GetPCTList() : std::vector<unsigned int>())
+        {
+            if (poFrom->GetPCTChannel(nTable) != oChannel.channel || oNumbers.contains({oChannel.source, nTable}))
+                continue;
+            auto* const poTo = oTarget.Find<IPCTDataset>();
+            const std::string what = Of(oPlan, oChannel.source, fmt::format("colour table {}", nTable));
+            if (poTo == nullptr)
+            {
+                Warn(what + " is not kept: the format has none");
+                continue;
+            }
+            oTarget.Try(what,
+                        [&]
+                        {
+                            const std::unique_ptr<krv::gobs::PCT> poTable(poFrom->GetPCT(nTable));
+                            const unsigned int nNew = poTo->CreatePCT(*poTable, nPosition);
+                            oNumbers[{oChannel.source, nTable}] = nNew;
+                            const std::string description = poFrom->GetPCTDescription(nTable);
+                            if (!description.empty())
+                                poTo->SetPCTDescription(nNew, description);
+                        });
+        }
+    }
+    return oNumbers;
+}
+
+// Where the first file lies on the ground. The identity says nothing, unless a reference system stands beside it and no
+// control points do.
+void CopyGeography(const CopyPlan& oPlan, const Target& oTarget)
+{
+    const SourceFile& oSource = oPlan.GetSource(0);
+    std::unique_ptr<krv::ogc::cs::ICRS> poCrs;
+    oTarget.Try(Of(oPlan, 0, "the reference system"), [&] { poCrs.reset(oSource.GetDataset().ReadCRS()); });
+    if (poCrs != nullptr)
+        oTarget.Try(Of(oPlan, 0, "the reference system"), [&] { oTarget.Get().UpdateCRS(*poCrs); });
+    const auto* const poFrom = dynamic_cast<IGeocodedDataset*>(&oSource.GetDataset());
+    if (poFrom == nullptr)
+        return;
+    const bool bPlaced = poCrs != nullptr && oSource.GetMetadata().GetFileMetadataValue("GroundControlPoints").empty();
+    const krv::ogc::cs::GeocodingInfo& oInfo = poFrom->GetGeocoding();
+    for (std::size_t s = 1; s < oPlan.GetSourceCount(); ++s)
+    {
+        const auto* const poOther = dynamic_cast<IGeocodedDataset*>(&oPlan.GetSource(s).GetDataset());
+        if (poOther != nullptr && !(poOther->GetGeocoding() == oInfo))
+            Warn(Of(oPlan, s, "it lies elsewhere than " + oSource.GetName() + ", whose place is taken"));
+    }
+    if (oInfo.IsIdentity() && !bPlaced)
+        return;
+    auto* const poTo = oTarget.Find<IGeocodedDataset>();
+    if (poTo == nullptr)
+        return Warn(Of(oPlan, 0, "the geocoding is not kept: the format has none"));
+    oTarget.Try(Of(oPlan, 0, "the geocoding"),
+                [&] { poTo->SetGeocoding(ShiftGeocoding(oInfo, oPlan.GetWindow().x, oPlan.GetWindow().y)); });
+}
+
+void CopyChannels(const CopyPlan& oPlan, const Target& oTarget)
+{
+    const auto& oChannels = oPlan.GetChannels();
+    std::vector<krv::gobs::DataType> oTypes = oPlan.GetTypes();
+    Progress oProgress("convert",
+                       [&]
+                       {
+                           std::uint64_t nBytes = 0;
+                           for (const auto& oType : oTypes)
+                               nBytes +=
+                                   krv::gobs::BufferBytes(oPlan.GetWindow().width, oPlan.GetWindow().height, 1, oType);
+                           return nBytes;
+                       }());
+    std::sort(oTypes.begin(), oTypes.end());
+    oTypes.erase(std::unique(oTypes.begin(), oTypes.end()), oTypes.end());
+    for (const krv::gobs::DataType& oType : oTypes)
+    {
+        // The channels of one type make one writer; those of one file and type one reader.
+        std::vector<unsigned int> oWritten;
+        std::vector<std::pair<std::size_t, krv::gobs::DataType>> oKeys;
+        std::vector<std::vector<unsigned int>> oRead;
+        std::vector<CopySource> oSources;
+        for (std::size_t i = 0; i < oChannels.size(); ++i)
+        {
+            if (oChannels[i].to != oType)
+                continue;
+            const std::pair oKey(oChannels[i].source, oChannels[i].from);
+            const auto nAt = static_cast<std::size_t>(std::find(oKeys.begin(), oKeys.end(), oKey) - oKeys.begin());
+            if (nAt == oKeys.size())
+            {
+                oKeys.push_back(oKey);
+                oRead.emplace_back();
+                oSources.emplace_back();
+            }
+            oRead[nAt].push_back(oChannels[i].channel);
+            oSources[nAt].positions.push_back(static_cast<unsigned int>(oWritten.size()));
+            oWritten.push_back(static_cast<unsigned int>(i) + 1);
+        }
+        std::vector<LevelReader> oReaders;
+        for (std::size_t nAt = 0; nAt < oKeys.size(); ++nAt)
+            oReaders.push_back(oPlan.GetSource(oKeys[nAt].first).Read(oRead[nAt]));
+        for (std::size_t nAt = 0; nAt < oKeys.size(); ++nAt)
+            oSources[nAt].reader = &oReaders[nAt].Get();
+        BasicWriter oWriter(&oTarget.GetRaster(), oWritten);
+        CopyPixels(oSources, oWriter, oPlan.GetWindow(), oProgress);
+    }
+}
+
+void CopyBitmap(IBitmapDataset& oFrom, unsigned int nFrom, IBitmapDataset& oTo, const PixelWindow& oWindow)
+{
+    const unsigned int nTo = oTo.CreateBitmap();
+    oTo.SetBitmapDescription(nTo, oFrom.GetBitmapDescription(nFrom));
+    const MetadataMap oTags = oFrom.GetBitmapMetadata(nFrom);
+    if (!oTags.empty())
+        oTo.SetBitmapMetadata(nTo, oTags);
+    BasicReader oReader(&oFrom, {nFrom}, false);
+    BasicWriter oWriter(&oTo, {nTo});
+    Progress oProgress("bitmap", std::uint64_t{oWindow.width} * oWindow.height);
+    CopyPixels({{&oReader, {0}}}, oWriter, oWindow, oProgress);
+}
+
+// Those of the first file: a validity mask of another one would hold for all channels.
+void CopyBitmaps(const CopyPlan& oPlan, const Target& oTarget)
+{
+    auto* const poTo = oTarget.Find<IBitmapDataset>();
+    for (std::size_t s = 0; s < oPlan.GetSourceCount(); ++s)
+    {
+        auto* const poFrom = dynamic_cast<IBitmapDataset*>(&oPlan.GetSource(s).GetDataset());
+        const auto oList = poFrom != nullptr ? poFrom->GetBitmapList() : std::vector<unsigned int>();
+        if (oList.empty())
+            continue;
+        if (poTo == nullptr || s > 0)
+        {
+            Warn(Of(oPlan, s,
+                    poTo == nullptr ? "bitmaps are not kept: the format has none"
+                                    : "bitmaps are not kept: those of the first file are"));
+            continue;
+        }
+        for (const unsigned int nBitmap : oList)
+            CopyBitmap(*poFrom, nBitmap, *poTo, oPlan.GetWindow());
+    }
+}
+
+} // namespace
+
+void Convert(const CopyRequest& oRequest, const TargetForm& oForm)
+{
+    CheckTarget(oRequest, oForm.name);
+    const CopyPlan oPlan(oRequest);
+    const Target oTarget(oPlan, oForm);
+    const TableNumbers oTables = CopyTables(oPlan, oTarget);
+    CopyGeography(oPlan, oTarget);
+    const AuxiliaryData oRecord = MakeRecord(oPlan, oForm.name, oTables);
+    oTarget.Try("the metadata", [&] { oTarget.Get().WriteAuxiliaryData(oRecord); });
+    CopyChannels(oPlan, oTarget);
+    CopyBitmaps(oPlan, oTarget);
+    oTarget.Get().Close();
+}
+
+} // namespace krv::tool

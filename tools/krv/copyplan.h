@@ -1,0 +1,76 @@
+#pragma once
+
+#include "gobs/raster/datatype.h"
+#include "tools/krv/sourcefile.h"
+
+#include <cstddef>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace krv::tool
+{
+
+// A rectangle of pixels.
+struct PixelWindow
+{
+    unsigned int x = 0;
+    unsigned int y = 0;
+    unsigned int width = 0;
+    unsigned int height = 0;
+};
+
+// What the user wants copied.
+struct CopyRequest
+{
+    std::vector<std::string> sources;
+    std::vector<unsigned int> channels;      // counted from 1 through all files; empty: all
+    std::optional<PixelWindow> window;       // nothing: the whole image
+    std::optional<krv::gobs::DataType> type; // of all channels; nothing: each keeps its own
+    bool promote = false;                    // the smallest type that holds all, in place of `type`
+};
+
+// One channel of the copy and where it comes from.
+struct CopiedChannel
+{
+    std::size_t source = 0;
+    unsigned int channel = 0;
+    krv::gobs::DataType from;
+    krv::gobs::DataType to;
+};
+
+// The opened files, the channels of the copy in their order, and the part of the image.
+class CopyPlan
+{
+public:
+    // Opens the files. Throws UsageError for channels and windows that are not there, DataException for files of
+    // different sizes. Warns of conversions that can change values and of no-data values that get lost in them.
+    explicit CopyPlan(const CopyRequest& oRequest);
+
+    const SourceFile& GetSource(std::size_t nSource) const { return *moSources[nSource]; }
+    std::size_t GetSourceCount() const { return moSources.size(); }
+    const std::vector<CopiedChannel>& GetChannels() const { return moChannels; }
+    const PixelWindow& GetWindow() const { return moWindow; }
+    // Whether the copy is of a part of the image.
+    bool IsCut() const;
+    // Whether values may change.
+    bool IsLossy() const { return mbLossy; }
+    // Whether these are all channels of one file in its own order.
+    bool IsWholeFile() const;
+    std::vector<krv::gobs::DataType> GetTypes() const;
+
+private:
+    void CheckSizes() const;
+    void ChooseChannels(const std::vector<unsigned int>& oWanted);
+    void ChooseWindow(const std::optional<PixelWindow>& oWanted);
+    void ChooseTypes(const CopyRequest& oRequest);
+    void WarnOfLosses();
+
+    std::vector<std::unique_ptr<SourceFile>> moSources;
+    std::vector<CopiedChannel> moChannels;
+    PixelWindow moWindow;
+    bool mbLossy = false;
+};
+
+} // namespace krv::tool

@@ -1,0 +1,95 @@
+#include "toolkit/exceptions/exceptions.h"
+#include "tools/krv/conversion.h"
+#include "tools/krv/errors.h"
+#include "tools/krv/verbs/verbs.h"
+
+#include <CLI/CLI.hpp>
+
+#include <algorithm>
+#include <cctype>
+#include <limits>
+#include <memory>
+
+namespace krv::tool
+{
+
+namespace
+{
+
+struct Options
+{
+    std::vector<std::string> files;
+    std::string channels;
+    std::string window;
+    std::string type;
+    TargetForm form;
+};
+
+krv::gobs::DataType ParseType(std::string text)
+{
+    std::transform(text.begin(), text.end(), text.begin(), [](unsigned char c) { return std::toupper(c); });
+    std::string all;
+    for (int nCode = krv::gobs::eDT_8U; nCode <= krv::gobs::eDT_C64R; ++nCode)
+    {
+        const krv::gobs::DataType oType(static_cast<krv::gobs::NativeDataTypeCode>(nCode));
+        if (oType.Describe() == text)
+            return oType;
+        all += " " + oType.Describe();
+    }
+    throw UsageError("--type: \"" + text + "\" is none of promoted" + all);
+}
+
+PixelWindow ParseWindow(const std::string& text)
+{
+    const auto oNumbers = ParseNumbers(text, "--window");
+    if (oNumbers.size() != 4)
+        throw UsageError("--window: \"" + text + "\" is not of the form x,y,width,height");
+    return {oNumbers[0], oNumbers[1], oNumbers[2], oNumbers[3]};
+}
+
+int RunConvert(Options& oOptions)
+{
+    CopyRequest oRequest;
+    oOptions.form.name = oOptions.files.back();
+    oRequest.sources.assign(oOptions.files.begin(), oOptions.files.end() - 1);
+    oRequest.channels = ParseNumbers(oOptions.channels, "--channels");
+    if (!oOptions.window.empty())
+        oRequest.window = ParseWindow(oOptions.window);
+    oRequest.promote = oOptions.type == "promoted";
+    if (!oOptions.type.empty() && !oRequest.promote)
+        oRequest.type = ParseType(oOptions.type);
+    Convert(oRequest, oOptions.form);
+    return 0;
+}
+
+} // namespace
+
+void AddConvertVerb(CLI::App& oApp, Selection& oSelection)
+{
+    auto* const poVerb = oApp.add_subcommand(
+        "convert", "Copies a file into a new one, or stacks the channels of several files of one size");
+    const auto poOptions = std::make_shared<Options>();
+    poVerb->add_option("FILES", poOptions->files, "The files to copy, and last the new one, which is replaced")
+        ->required()
+        ->expected(2, std::numeric_limits<int>::max());
+    poVerb->add_option("--channels", poOptions->channels,
+                       "Only these, in this order, such as 3,1; counted through all files");
+    poVerb->add_option("--window", poOptions->window, "Only this part: x,y,width,height in pixels");
+    poVerb->add_option("--type", poOptions->type,
+                       "Values of this type, such as 16S, or of the smallest that holds all: promoted");
+    poVerb->add_option("--format", poOptions->form.format,
+                       "The new file's format (`krv formats`); else by its extension, else TIF");
+    poVerb->add_option("--options", poOptions->form.options,
+                       "\"KEY=VALUE ...\" of the format, such as \"COMPRESS=ZSTD BLOCKXSIZE=512\"");
+    poVerb->callback(
+        [&oSelection, poOptions]
+        {
+            oSelection.file = poOptions->files.front();
+            oSelection.run = [poOptions]
+            {
+                return RunConvert(*poOptions);
+            };
+        });
+}
+
+} // namespace krv::tool
