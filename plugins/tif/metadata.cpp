@@ -248,8 +248,9 @@ std::string ReadText(TIFF* poTiff, std::uint32_t nTag)
     const TIFFField* poField = TIFFFindField(poTiff, nTag, TIFF_ANY);
     if (poField == nullptr)
         return {};
-    const TIFFDataType eType = TIFFFieldDataType(poField);
-    if (eType != TIFF_ASCII && eType != TIFF_BYTE && eType != TIFF_UNDEFINED)
+    // A number: for a tag that libtiff does not know it is what the file says, any 16 bits.
+    const int nType = static_cast<int>(TIFFFieldDataType(poField));
+    if (nType != TIFF_ASCII && nType != TIFF_BYTE && nType != TIFF_UNDEFINED)
         return {};
     const char* pText = nullptr;
     if (TIFFFieldPassCount(poField) == 0)
