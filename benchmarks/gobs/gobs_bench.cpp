@@ -1,13 +1,11 @@
-// Measures raster allocation against reused buffers, conversion against memcpy of the result, margins and masks against
-// memcpy of the tile.
-//     krv_bench_gobs [--only memory|conversion|margins|masks]
+// Measures raster allocation against reused buffers, margins and masks against memcpy of the tile.
+//     krv_bench_gobs [--only memory|margins|masks]
 
 #include "benchmarks/support/measure.h"
 #include "gobs/mask/mask.h"
 #include "gobs/raster/margins.h"
 #include "gobs/raster/raster.h"
 #include "toolkit/core/hmalloc.h"
-#include "toolkit/raster/copydata.h"
 
 #include <algorithm>
 #include <cstring>
@@ -21,7 +19,6 @@ namespace
 
 using namespace krv::benchmarks;
 using namespace krv::gobs;
-using namespace krv::raster;
 
 constexpr int ROUNDS = 9;
 constexpr std::uint64_t KIB = 1024;
@@ -158,80 +155,6 @@ void MeasureMemory()
         OneAtATime(nBytes);
 }
 
-struct Conversion
-{
-    const char* msName;
-    BufferType meFrom;
-    std::uint64_t mnFromStride;
-    BufferType meTo;
-    std::uint64_t mnToStride;
-    unsigned int mnChannels;
-    double mnGoal;
-};
-
-// nPixels: few stay in the caches, many do not. memcpy moves as many bytes as the conversion writes.
-void MeasureConversion(const Conversion& o, std::uint64_t nPixels)
-{
-    const std::uint64_t nFromBytes = BufferDataSize(o.meFrom, nPixels * o.mnFromStride);
-    const std::uint64_t nToBytes = BufferDataSize(o.meTo, nPixels * o.mnToStride);
-    const std::uint64_t nWritten = BufferDataSize(o.meTo, nPixels * o.mnChannels);
-    std::vector<unsigned char> oSource(nFromBytes + 16, 1);
-    std::vector<unsigned char> oTarget(nToBytes + 16);
-    std::vector<unsigned char> oResult(nWritten, 1);
-    const auto nRepeats = static_cast<int>(std::max<std::uint64_t>(1, 16 * MIB / nWritten));
-    const auto Copy = [&]
-    {
-        for (int i = 0; i < nRepeats; ++i)
-        {
-            std::memcpy(oTarget.data(), oResult.data(), nWritten);
-            Keep(oTarget.data());
-        }
-    };
-    const auto Convert = [&]
-    {
-        for (int i = 0; i < nRepeats; ++i)
-        {
-            CopyData(oSource.data(), o.meFrom, o.mnFromStride, oTarget.data(), o.meTo, o.mnToStride, nPixels,
-                     o.mnChannels);
-            Keep(oTarget.data());
-        }
-    };
-    const auto oSeconds = MedianSeconds({{"memcpy", Copy}, {"convert", Convert}}, ROUNDS);
-    PrintRow(std::string(o.msName) + (nPixels > 100000 ? ", large" : ", tile"), oSeconds[0] / oSeconds[1], o.mnGoal,
-             Number(static_cast<double>(nWritten) * nRepeats / oSeconds[1] / 1e9) + " GB/s written");
-}
-
-void MeasureConversions()
-{
-    constexpr Conversion CONVERSIONS[] = {
-        {"8U to 32R", eBT_8U, 1, eBT_32R, 1, 1, 0.9},
-        {"16U to 32R", eBT_16U, 1, eBT_32R, 1, 1, 0.9},
-        {"16U to 64R", eBT_16U, 1, eBT_64R, 1, 1, 0.9},
-        {"16S to 32S", eBT_16S, 1, eBT_32S, 1, 1, 0.9},
-        {"32R to 16U", eBT_32R, 1, eBT_16U, 1, 1, 0.4},
-        {"32R to 8U", eBT_32R, 1, eBT_8U, 1, 1, 0},
-        {"32R to 32U", eBT_32R, 1, eBT_32U, 1, 1, 0},
-        {"64R to 16S", eBT_64R, 1, eBT_16S, 1, 1, 0},
-        {"64R to 32R", eBT_64R, 1, eBT_32R, 1, 1, 0},
-        {"32S to 16U", eBT_32S, 1, eBT_16U, 1, 1, 0},
-        {"16U to 8U", eBT_16U, 1, eBT_8U, 1, 1, 0},
-        {"C16S to C32R", eBT_C16S, 1, eBT_C32R, 1, 1, 0},
-        {"C32R to 32R", eBT_C32R, 1, eBT_32R, 1, 1, 0},
-        {"32R to C32R", eBT_32R, 1, eBT_C32R, 1, 1, 0},
-        {"one of 3 x 8U out", eBT_8U, 3, eBT_8U, 1, 1, 0},
-        {"one of 3 x 8U in", eBT_8U, 1, eBT_8U, 3, 1, 0},
-        {"one of 4 x 16U out", eBT_16U, 4, eBT_16U, 1, 1, 0},
-        {"one of 4 x 16U in", eBT_16U, 1, eBT_16U, 4, 1, 0},
-        {"one of 3 x 8U to 32R", eBT_8U, 3, eBT_32R, 1, 1, 0},
-        {"3 x 8U to 3 of 4 x 32R", eBT_8U, 3, eBT_32R, 4, 3, 0},
-        {"16U to one of 4 x 32R", eBT_16U, 1, eBT_32R, 4, 1, 0},
-    };
-    PrintHeading("Conversion against memcpy of the values written");
-    for (const Conversion& oConversion : CONVERSIONS)
-        for (std::uint64_t nPixels : {256 * 256, 4096 * 1024})
-            MeasureConversion(oConversion, nPixels);
-}
-
 void MeasureMargins(unsigned int nMargin, unsigned int nChannels, NativeDataTypeCode eType)
 {
     Raster oRaster(RasterInfo(256, 256, nChannels, DataType(eType)), RasterContext(0, 0, nMargin, nMargin));
@@ -344,8 +267,6 @@ int main(int nArguments, char** sArguments)
     const std::string sOnly = nArguments > 2 && std::string(sArguments[1]) == "--only" ? sArguments[2] : "";
     if (sOnly.empty() || sOnly == "memory")
         MeasureMemory();
-    if (sOnly.empty() || sOnly == "conversion")
-        MeasureConversions();
     if (sOnly.empty() || sOnly == "margins")
         MeasureAllMargins();
     if (sOnly.empty() || sOnly == "masks")

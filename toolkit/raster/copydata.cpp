@@ -1,13 +1,11 @@
 #include "toolkit/raster/copydata.h"
 
 #include "toolkit/exceptions/exceptions.h"
-#include "toolkit/raster/detail/saturate.h"
+#include "toolkit/raster/detail/layout.h"
 #include "toolkit/raster/detail/stridedmove.h"
 
 #include <algorithm>
-#include <array>
 #include <string>
-#include <tuple>
 
 namespace krv::raster
 {
@@ -15,54 +13,10 @@ namespace krv::raster
 namespace
 {
 
-using PartTypes = std::tuple<std::uint8_t, std::int8_t, std::uint16_t, std::int16_t, std::uint32_t, std::int32_t, float,
-                             std::uint64_t, std::int64_t, double>;
-constexpr std::size_t PART_COUNT = std::tuple_size_v<PartTypes>;
-constexpr std::array<std::size_t, PART_COUNT> PART_BYTES = {1, 1, 2, 2, 4, 4, 4, 8, 8, 8};
-
-// A buffer type as a part type (an index of PartTypes) and a number of parts.
-struct Layout
-{
-    std::size_t mnPart;
-    std::size_t mnParts;
-
-    std::size_t PartBytes() const { return PART_BYTES[mnPart]; }
-    bool IsComplex() const { return mnParts == 2; }
-};
-
-Layout LayoutOf(BufferType eType, const char* sParameter, const Place& oPlace)
-{
-    constexpr std::size_t COMPLEX_PARTS[] = {2, 3, 5, 6, 9};
-    if (eType < eBT_8U || eType > eBT_C64R)
-        throw ParameterException("There is no buffer type " + std::to_string(static_cast<int>(eType)),
-                                 ParameterException::eInvalidValue, sParameter, oPlace);
-    const auto nType = static_cast<std::size_t>(eType);
-    return nType < PART_COUNT ? Layout{nType, 1} : Layout{COMPLEX_PARTS[nType - PART_COUNT], 2};
-}
-
-// Packed values from one part type to another.
-using Converter = void (*)(const unsigned char*, unsigned char*, std::size_t);
-
-template <std::size_t NSource, std::size_t NTarget>
-void Convert(const unsigned char* pSource, unsigned char* pTarget, std::size_t nCount)
-{
-    using TSource = std::tuple_element_t<NSource, PartTypes>;
-    using TTarget = std::tuple_element_t<NTarget, PartTypes>;
-    if constexpr (NSource == NTarget)
-        std::memcpy(pTarget, pSource, nCount * sizeof(TSource));
-    else if constexpr (detail::HAS_SATURATING_KERNEL<TSource, TTarget>)
-        detail::ConvertSaturated<TSource, TTarget>(pSource, pTarget, nCount);
-    else
-        detail::ConvertPlain<TSource, TTarget>(pSource, pTarget, 0, nCount);
-}
-
-template <std::size_t... N>
-constexpr std::array<Converter, sizeof...(N)> MakeConverters(std::index_sequence<N...>)
-{
-    return {Convert<N / PART_COUNT, N % PART_COUNT>...};
-}
-
-constexpr auto CONVERTERS = MakeConverters(std::make_index_sequence<PART_COUNT * PART_COUNT>());
+using detail::Converter;
+using detail::Layout;
+using detail::LayoutOf;
+using detail::PART_BYTES;
 
 // One end of a copy: runs of adjacent parts, `mnStride` parts from one run to the next.
 template <typename TByte>
@@ -87,7 +41,7 @@ void ConvertInBlocks(const SourceSide& oSource, const TargetSide& oTarget, std::
 {
     alignas(64) unsigned char oGathered[BLOCK_PARTS * 8];
     alignas(64) unsigned char oConverted[BLOCK_PARTS * 8];
-    const Converter Run = CONVERTERS[oSource.mnPart * PART_COUNT + oTarget.mnPart];
+    const Converter Run = detail::GetKernels().GetConverter(oSource.mnPart, oTarget.mnPart);
     const bool bSourcePacked = oSource.mnStride == nRunParts;
     const bool bTargetPacked = oTarget.mnStride == nRunParts;
     const std::size_t nSourceRun = nRunParts * oSource.PartBytes();
@@ -108,7 +62,7 @@ void ConvertInBlocks(const SourceSide& oSource, const TargetSide& oTarget, std::
 
 void CopyRuns(const SourceSide& oSource, const TargetSide& oTarget, std::uint64_t nRuns, std::uint64_t nRunParts)
 {
-    const Converter Run = CONVERTERS[oSource.mnPart * PART_COUNT + oTarget.mnPart];
+    const Converter Run = detail::GetKernels().GetConverter(oSource.mnPart, oTarget.mnPart);
     if (nRuns == 1 || (oSource.mnStride == nRunParts && oTarget.mnStride == nRunParts))
         Run(oSource.mpBuffer, oTarget.mpBuffer, static_cast<std::size_t>(nRuns * nRunParts));
     else if (oSource.mnPart == oTarget.mnPart)

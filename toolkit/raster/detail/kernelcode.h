@@ -1,0 +1,334 @@
+#pragma once
+
+// The inner loops. One source file for each instruction set includes this and is compiled with options of its own, so
+// everything here is local to the file and calls nothing that is not: a function that the linker shares could be the
+// other file's. Loops are plain and free of branches; the compiler makes vectors of them.
+
+#include "toolkit/raster/detail/kernels.h"
+#include "toolkit/raster/detail/roundvectors.h"
+
+#include <cstring>
+#include <limits>
+#include <type_traits>
+#include <utility>
+
+#ifdef __SSE4_1__
+#include <immintrin.h>
+#endif
+
+namespace krv::raster::detail
+{
+
+namespace
+{
+
+template <typename TTarget, typename TSource>
+inline TTarget ClampInteger(TSource nValue)
+{
+    using Source = std::numeric_limits<TSource>;
+    using Target = std::numeric_limits<TTarget>;
+    constexpr bool BELOW = std::is_signed_v<TSource> && (!std::is_signed_v<TTarget> || Source::digits > Target::digits);
+    if constexpr (BELOW)
+    {
+        constexpr TSource LOWEST = static_cast<TSource>(Target::min());
+        nValue = nValue < LOWEST ? LOWEST : nValue;
+    }
+    if constexpr (Source::digits > Target::digits)
+    {
+        constexpr TSource MOST = static_cast<TSource>(Target::max());
+        nValue = nValue > MOST ? MOST : nValue;
+    }
+    return static_cast<TTarget>(nValue);
+}
+
+template <typename TTarget, typename TSource>
+inline TTarget RoundInteger(TSource nValue)
+{
+    using Limits = std::numeric_limits<TTarget>;
+    // 2 to the number of magnitude bits: the first whole number above the type, exact in both real types.
+    constexpr TSource END = static_cast<TSource>(Limits::max() / 2 + 1) * 2;
+    constexpr TSource LOWEST = static_cast<TSource>(Limits::min());
+    const TSource nRounded = static_cast<TSource>(__builtin_rint(nValue));
+    if (!(nRounded < END))
+        return nRounded >= END ? Limits::max() : TTarget(0);
+    return nRounded < LOWEST ? Limits::min() : static_cast<TTarget>(nRounded);
+}
+
+template <typename TTarget, typename TSource>
+inline TTarget ConvertValue(TSource nValue)
+{
+    if constexpr (std::is_floating_point_v<TTarget>)
+        return static_cast<TTarget>(nValue);
+    else if constexpr (std::is_integral_v<TSource>)
+        return ClampInteger<TTarget>(nValue);
+    else
+        return RoundInteger<TTarget>(nValue);
+}
+
+template <typename TSource, typename TTarget>
+inline void ConvertPlain(const unsigned char* __restrict pSource, unsigned char* __restrict pTarget, std::size_t nFirst,
+                         std::size_t nCount)
+{
+    for (std::size_t i = nFirst; i < nCount; ++i)
+    {
+        TSource nFrom;
+        std::memcpy(&nFrom, pSource + i * sizeof(TSource), sizeof(TSource));
+        const TTarget nTo = ConvertValue<TTarget>(nFrom);
+        std::memcpy(pTarget + i * sizeof(TTarget), &nTo, sizeof(TTarget));
+    }
+}
+
+template <typename TSource, typename TTarget>
+inline std::size_t ConvertRounded([[maybe_unused]] const unsigned char* pSource,
+                                  [[maybe_unused]] unsigned char* pTarget, [[maybe_unused]] std::size_t nCount)
+{
+    std::size_t i = 0;
+#ifdef __SSE4_1__
+    if constexpr (std::is_floating_point_v<TSource> && std::is_integral_v<TTarget> && sizeof(TTarget) <= 4)
+    {
+        constexpr std::size_t LANES = sizeof(Ints) / sizeof(TTarget);
+        for (; i + LANES <= nCount; i += LANES)
+            StoreInts(pTarget + i * sizeof(TTarget),
+                      RoundedVector<TTarget>(reinterpret_cast<const TSource*>(pSource) + i));
+    }
+#endif
+    return i;
+}
+
+template <std::size_t NSource, std::size_t NTarget>
+void Convert(const unsigned char* pSource, unsigned char* pTarget, std::size_t nCount)
+{
+    using TSource = std::tuple_element_t<NSource, PartTypes>;
+    using TTarget = std::tuple_element_t<NTarget, PartTypes>;
+    if constexpr (NSource == NTarget)
+        std::memcpy(pTarget, pSource, nCount * sizeof(TSource));
+    else
+    {
+        const std::size_t nDone = ConvertRounded<TSource, TTarget>(pSource, pTarget, nCount);
+        ConvertPlain<TSource, TTarget>(pSource, pTarget, nDone, nCount);
+    }
+}
+
+#ifdef __SSE4_1__
+
+// The values of 16 bytes, converted and written; for the pairs that mixed files meet in, and without conversion.
+template <typename TSource, typename TTarget>
+inline constexpr bool CAN_STORE = std::is_same_v<TSource, TTarget>;
+template <>
+inline constexpr bool CAN_STORE<std::uint8_t, float> = true;
+template <>
+inline constexpr bool CAN_STORE<std::uint16_t, float> = true;
+template <>
+inline constexpr bool CAN_STORE<std::int16_t, float> = true;
+template <>
+inline constexpr bool CAN_STORE<std::uint16_t, double> = true;
+template <>
+inline constexpr bool CAN_STORE<std::int16_t, double> = true;
+template <>
+inline constexpr bool CAN_STORE<float, double> = true;
+
+#ifdef __AVX2__
+using MergeVector = __m256i;
+
+// The same 16 bytes for both halves.
+inline MergeVector LoadTerm(const unsigned char* p)
+{
+    return _mm256_broadcastsi128_si256(_mm_loadu_si128(reinterpret_cast<const __m128i*>(p)));
+}
+inline MergeVector LoadShuffle(const unsigned char* p)
+{
+    return _mm256_loadu_si256(reinterpret_cast<const __m256i*>(p));
+}
+inline MergeVector Shuffle(MergeVector o, MergeVector oShuffle)
+{
+    return _mm256_shuffle_epi8(o, oShuffle);
+}
+inline MergeVector Unite(MergeVector a, MergeVector b)
+{
+    return _mm256_or_si256(a, b);
+}
+
+inline void StoreEight(float* p, __m256i o)
+{
+    _mm256_storeu_ps(p, _mm256_cvtepi32_ps(o));
+}
+inline void StoreEight(double* p, __m256i o)
+{
+    _mm256_storeu_pd(p, _mm256_cvtepi32_pd(_mm256_castsi256_si128(o)));
+    _mm256_storeu_pd(p + 4, _mm256_cvtepi32_pd(_mm256_extracti128_si256(o, 1)));
+}
+
+template <typename TSource, typename TTarget>
+inline void StoreHalf(TTarget* pTarget, __m128i o)
+{
+    if constexpr (std::is_same_v<TSource, std::uint8_t>)
+    {
+        StoreEight(pTarget, _mm256_cvtepu8_epi32(o));
+        StoreEight(pTarget + 8, _mm256_cvtepu8_epi32(_mm_srli_si128(o, 8)));
+    }
+    else if constexpr (std::is_same_v<TSource, std::uint16_t>)
+        StoreEight(pTarget, _mm256_cvtepu16_epi32(o));
+    else if constexpr (std::is_same_v<TSource, std::int16_t>)
+        StoreEight(pTarget, _mm256_cvtepi16_epi32(o));
+    else
+        _mm256_storeu_pd(pTarget, _mm256_cvtps_pd(_mm_castsi128_ps(o)));
+}
+
+template <typename TSource, typename TTarget>
+inline void StoreVector(unsigned char* pBytes, MergeVector o)
+{
+    if constexpr (std::is_same_v<TSource, TTarget>)
+        _mm256_storeu_si256(reinterpret_cast<__m256i*>(pBytes), o);
+    else
+    {
+        auto* const pTarget = reinterpret_cast<TTarget*>(pBytes);
+        StoreHalf<TSource>(pTarget, _mm256_castsi256_si128(o));
+        StoreHalf<TSource>(pTarget + 16 / sizeof(TSource), _mm256_extracti128_si256(o, 1));
+    }
+}
+#else
+using MergeVector = __m128i;
+
+inline MergeVector LoadTerm(const unsigned char* p)
+{
+    return _mm_loadu_si128(reinterpret_cast<const __m128i*>(p));
+}
+inline MergeVector LoadShuffle(const unsigned char* p)
+{
+    return LoadTerm(p);
+}
+inline MergeVector Shuffle(MergeVector o, MergeVector oShuffle)
+{
+    return _mm_shuffle_epi8(o, oShuffle);
+}
+inline MergeVector Unite(MergeVector a, MergeVector b)
+{
+    return _mm_or_si128(a, b);
+}
+
+inline void StoreFour(float* p, __m128i o)
+{
+    _mm_storeu_ps(p, _mm_cvtepi32_ps(o));
+}
+inline void StoreFour(double* p, __m128i o)
+{
+    _mm_storeu_pd(p, _mm_cvtepi32_pd(o));
+    _mm_storeu_pd(p + 2, _mm_cvtepi32_pd(_mm_unpackhi_epi64(o, o)));
+}
+
+template <typename TSource, typename TTarget>
+inline void StoreVector(unsigned char* pBytes, MergeVector o)
+{
+    auto* const pTarget = reinterpret_cast<TTarget*>(pBytes);
+    const __m128i oUpper = _mm_unpackhi_epi64(o, o);
+    if constexpr (std::is_same_v<TSource, TTarget>)
+        _mm_storeu_si128(reinterpret_cast<__m128i*>(pBytes), o);
+    else if constexpr (std::is_same_v<TSource, std::uint8_t>)
+    {
+        StoreFour(pTarget, _mm_cvtepu8_epi32(o));
+        StoreFour(pTarget + 4, _mm_cvtepu8_epi32(_mm_srli_si128(o, 4)));
+        StoreFour(pTarget + 8, _mm_cvtepu8_epi32(oUpper));
+        StoreFour(pTarget + 12, _mm_cvtepu8_epi32(_mm_srli_si128(o, 12)));
+    }
+    else if constexpr (std::is_same_v<TSource, std::uint16_t>)
+    {
+        StoreFour(pTarget, _mm_cvtepu16_epi32(o));
+        StoreFour(pTarget + 4, _mm_cvtepu16_epi32(oUpper));
+    }
+    else if constexpr (std::is_same_v<TSource, std::int16_t>)
+    {
+        StoreFour(pTarget, _mm_cvtepi16_epi32(o));
+        StoreFour(pTarget + 4, _mm_cvtepi16_epi32(oUpper));
+    }
+    else
+    {
+        _mm_storeu_pd(pTarget, _mm_cvtps_pd(_mm_castsi128_ps(o)));
+        _mm_storeu_pd(pTarget + 2, _mm_cvtps_pd(_mm_castsi128_ps(oUpper)));
+    }
+}
+#endif
+
+// As many terms as stay in registers.
+template <std::size_t N, typename TSource, typename TTarget>
+inline void MergeFew(const MergeTerm* pTerms, unsigned char* pTarget, std::size_t nPeriodBytes, std::size_t nPeriods)
+{
+    const unsigned char* pSources[N];
+    std::size_t nSteps[N];
+    MergeVector oShuffles[N];
+    for (std::size_t n = 0; n < N; ++n)
+    {
+        pSources[n] = pTerms[n].mpSource;
+        nSteps[n] = pTerms[n].mnPeriodBytes;
+        oShuffles[n] = LoadShuffle(pTerms[n].mpShuffle);
+    }
+    for (std::size_t i = 0; i < nPeriods; ++i)
+    {
+        MergeVector oResult = {};
+        for (std::size_t n = 0; n < N; ++n)
+        {
+            oResult = Unite(oResult, Shuffle(LoadTerm(pSources[n]), oShuffles[n]));
+            pSources[n] += nSteps[n];
+        }
+        StoreVector<TSource, TTarget>(pTarget, oResult);
+        pTarget += nPeriodBytes;
+    }
+}
+
+template <typename TSource, typename TTarget>
+void Merge(const MergeTerm* pTerms, std::size_t nTerms, unsigned char* pTarget, std::size_t nPeriodBytes,
+           std::size_t nPeriods)
+{
+    switch (nTerms)
+    {
+    case 1:
+        return MergeFew<1, TSource, TTarget>(pTerms, pTarget, nPeriodBytes, nPeriods);
+    case 2:
+        return MergeFew<2, TSource, TTarget>(pTerms, pTarget, nPeriodBytes, nPeriods);
+    case 3:
+        return MergeFew<3, TSource, TTarget>(pTerms, pTarget, nPeriodBytes, nPeriods);
+    case 4:
+        return MergeFew<4, TSource, TTarget>(pTerms, pTarget, nPeriodBytes, nPeriods);
+    default:
+        break;
+    }
+    for (std::size_t i = 0; i < nPeriods; ++i)
+    {
+        MergeVector oResult = {};
+        for (std::size_t n = 0; n < nTerms; ++n)
+        {
+            const MergeVector oLoad = LoadTerm(pTerms[n].mpSource + i * pTerms[n].mnPeriodBytes);
+            oResult = Unite(oResult, Shuffle(oLoad, LoadShuffle(pTerms[n].mpShuffle)));
+        }
+        StoreVector<TSource, TTarget>(pTarget + i * nPeriodBytes, oResult);
+    }
+}
+
+constexpr std::size_t VECTOR_BYTES = sizeof(MergeVector);
+#else
+constexpr std::size_t VECTOR_BYTES = 16;
+#endif
+
+template <std::size_t NSource, std::size_t NTarget>
+constexpr MergeLoop FindMerge()
+{
+#ifdef __SSE4_1__
+    using TSource = std::tuple_element_t<NSource, PartTypes>;
+    using TTarget = std::tuple_element_t<NTarget, PartTypes>;
+    if constexpr (CAN_STORE<TSource, TTarget>)
+        return Merge<TSource, TTarget>;
+#endif
+    return nullptr;
+}
+
+template <std::size_t... N>
+constexpr Kernels MakeKernels(std::index_sequence<N...>)
+{
+    return {
+        {Convert<N / PART_COUNT, N % PART_COUNT>...}, {FindMerge<N / PART_COUNT, N % PART_COUNT>()...}, VECTOR_BYTES};
+}
+
+constexpr Kernels KERNELS = MakeKernels(std::make_index_sequence<PART_COUNT * PART_COUNT>());
+
+} // namespace
+
+} // namespace krv::raster::detail

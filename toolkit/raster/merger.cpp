@@ -1,0 +1,358 @@
+#include "toolkit/raster/merger.h"
+
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/raster/detail/layout.h"
+
+#include <algorithm>
+#include <cstring>
+#include <limits>
+#include <numeric>
+#include <string>
+
+namespace krv::raster
+{
+
+namespace
+{
+
+constexpr std::size_t MAX_VECTOR = 32;
+// What a block of pixels takes, results and all between: it stays in the first-level cache.
+constexpr std::uint64_t BLOCK_BYTES = 20 * 1024;
+// Conversions of a block leave no rest behind their vectors.
+constexpr std::uint64_t BLOCK_STEP = 32;
+
+// The smallest type that holds the values of all sources; the target's own unless that is larger. Parts are brought
+// together in it, since small ones are moved in fewer steps, and then converted at once.
+std::size_t ChooseMeeting(const std::vector<std::size_t>& oParts, std::size_t nTargetPart)
+{
+    std::size_t nBest = nTargetPart;
+    for (std::size_t nPart = 0; nPart < detail::PART_COUNT; ++nPart)
+    {
+        const auto bCovered = [nPart](std::size_t nSource)
+        {
+            return detail::PartCovers(nPart, nSource);
+        };
+        if (detail::PART_BYTES[nPart] < detail::PART_BYTES[nBest] &&
+            std::all_of(oParts.begin(), oParts.end(), bCovered))
+            nBest = nPart;
+    }
+    return nBest;
+}
+
+} // namespace
+
+// A source, as parts of the meeting type, is a stream; one of shorter unsigned integers is so as it is, since what is
+// missing of them is zeros. The bytes of the result follow a pattern that repeats every few pixels, a period: for each
+// of its vectors there is a list of terms.
+class Merger::Plan
+{
+public:
+    Plan(const std::vector<MergeSource>& oSources, BufferType eTarget, const std::vector<MergeChannel>& oChannels);
+
+    void Run(const std::vector<const unsigned char*>& oSources, unsigned char* pTarget, std::uint64_t nPixels);
+
+private:
+    struct Stream
+    {
+        detail::Converter mpConvert = nullptr; // null when the source is the stream
+        std::size_t mnSourceBytes = 0;         // of a pixel
+        std::size_t mnParts = 0;
+        std::size_t mnPartBytes = 0;
+        std::size_t mnBytes = 0; // of a pixel of the stream
+        std::size_t mnReach = 0; // bytes from the beginning of a period that its loads may touch
+        unsigned char* mpScratch = nullptr;
+        const unsigned char* mpBlock = nullptr;
+        std::uint64_t mnAvailable = 0; // bytes from mpBlock
+    };
+
+    struct Part
+    {
+        std::size_t mnStream = 0;
+        std::size_t mnOffset = 0; // bytes in the stream's pixel
+        std::size_t mnBytes = 0;  // 0: nothing is placed there
+    };
+
+    struct Term
+    {
+        std::size_t mnStream;
+        std::size_t mnOffset;
+        unsigned char moShuffle[MAX_VECTOR];
+    };
+
+    void AddStreams(const std::vector<MergeSource>& oSources, const std::vector<MergeChannel>& oChannels);
+    void PlaceParts(const std::vector<MergeSource>& oSources, const std::vector<MergeChannel>& oChannels);
+    void MakeVectors();
+    void AddTerms(std::size_t nVector, std::size_t nStream);
+    void MakeScratch();
+    void PrepareStreams(const std::vector<const unsigned char*>& oSources, std::uint64_t nFirst, std::uint64_t nPixels,
+                        std::size_t nCount);
+    void MergeBlock(unsigned char* pTarget, std::size_t nPixels);
+    std::size_t MergePeriods(detail::MergeLoop pMerge, unsigned char* pTarget, std::size_t nPixelBytes,
+                             std::size_t nPixels);
+    void MergePixels(std::size_t nFirst, std::size_t nPixels);
+
+    const detail::Kernels& moKernels = detail::GetKernels();
+    const std::size_t mnVector = moKernels.mnVectorBytes;
+    detail::Layout moTarget;
+    std::size_t mnMeeting = 0;
+    std::vector<Stream> moStreams;
+    std::vector<Part> moParts; // of a pixel of the result
+    bool mbIdentity = false;   // the result is the stream of the only source
+    std::size_t mnMergedBytes = 0;
+    std::size_t mnTargetBytes = 0;
+    std::size_t mnPeriodPixels = 0;
+    std::vector<Term> moTerms;
+    std::vector<std::size_t> moFirstTerms; // of each vector, and the count of all at the end
+    std::vector<detail::MergeTerm> moVectorTerms;
+    std::uint64_t mnBlockPixels = 0;
+    std::unique_ptr<unsigned char[]> mpoScratch;
+    unsigned char* mpMerged = nullptr;
+};
+
+Merger::Plan::Plan(const std::vector<MergeSource>& oSources, BufferType eTarget,
+                   const std::vector<MergeChannel>& oChannels)
+    : moTarget(detail::LayoutOf(eTarget, "eTarget", Place::Current()))
+{
+    AddStreams(oSources, oChannels);
+    PlaceParts(oSources, oChannels);
+    mnTargetBytes = moParts.size() * moTarget.PartBytes();
+    mnMergedBytes = moParts.size() * detail::PART_BYTES[mnMeeting];
+    if (mbIdentity || moParts.empty())
+        return;
+    MakeVectors();
+    MakeScratch();
+}
+
+void Merger::Plan::AddStreams(const std::vector<MergeSource>& oSources, const std::vector<MergeChannel>& oChannels)
+{
+    std::vector<std::size_t> oPartTypes;
+    for (const MergeChannel& oChannel : oChannels)
+    {
+        if (oChannel.mnSource == MergeChannel::NOWHERE)
+            continue;
+        if (oChannel.mnSource >= oSources.size() || oChannel.mnChannel >= oSources[oChannel.mnSource].mnChannels)
+            throw DataException("There is no channel " + std::to_string(oChannel.mnChannel) + " of source " +
+                                std::to_string(oChannel.mnSource));
+        oPartTypes.push_back(detail::LayoutOf(oSources[oChannel.mnSource].meType, "oSources", Place::Current()).mnPart);
+    }
+    mnMeeting = ChooseMeeting(oPartTypes, moTarget.mnPart);
+    std::uint64_t nPixelBytes = std::uint64_t{16} * oChannels.size();
+    for (const MergeSource& oSource : oSources)
+    {
+        const detail::Layout oLayout = detail::LayoutOf(oSource.meType, "oSources", Place::Current());
+        nPixelBytes += std::uint64_t{16} * oSource.mnChannels;
+        Stream oStream;
+        oStream.mnParts = oSource.mnChannels * oLayout.mnParts;
+        oStream.mnSourceBytes = oStream.mnParts * oLayout.PartBytes();
+        const bool bAsIs = oLayout.mnPart == mnMeeting || detail::IsZeroExtended(mnMeeting, oLayout.mnPart);
+        oStream.mnPartBytes = detail::PART_BYTES[bAsIs ? oLayout.mnPart : mnMeeting];
+        oStream.mnBytes = oStream.mnParts * oStream.mnPartBytes;
+        if (!bAsIs)
+            oStream.mpConvert = moKernels.GetConverter(oLayout.mnPart, mnMeeting);
+        moStreams.push_back(oStream);
+        if (nPixelBytes > std::numeric_limits<std::int32_t>::max())
+            throw DataException("A pixel is too large");
+    }
+}
+
+void Merger::Plan::PlaceParts(const std::vector<MergeSource>& oSources, const std::vector<MergeChannel>& oChannels)
+{
+    for (const MergeChannel& oChannel : oChannels)
+    {
+        const bool bPlaced = oChannel.mnSource != MergeChannel::NOWHERE;
+        const std::size_t nSourceParts =
+            bPlaced ? moStreams[oChannel.mnSource].mnParts / oSources[oChannel.mnSource].mnChannels : 0;
+        const std::size_t nBytes = bPlaced ? moStreams[oChannel.mnSource].mnPartBytes : 0;
+        for (std::size_t nPart = 0; nPart < moTarget.mnParts; ++nPart)
+            moParts.push_back({oChannel.mnSource, (oChannel.mnChannel * nSourceParts + nPart) * nBytes,
+                               nPart < nSourceParts ? nBytes : 0});
+    }
+    mbIdentity = moStreams.size() == 1 && moStreams.front().mnParts == moParts.size();
+    for (std::size_t nPart = 0; nPart < moParts.size() && mbIdentity; ++nPart)
+        mbIdentity = moParts[nPart].mnBytes != 0 && moParts[nPart].mnOffset == nPart * moParts[nPart].mnBytes;
+    if (mbIdentity)
+        moStreams.front().mpConvert = moKernels.GetConverter(
+            detail::LayoutOf(oSources.front().meType, "oSources", Place::Current()).mnPart, moTarget.mnPart);
+}
+
+void Merger::Plan::MakeVectors()
+{
+    mnPeriodPixels = mnVector / std::gcd(mnVector, mnMergedBytes);
+    const std::size_t nVectors = mnMergedBytes * mnPeriodPixels / mnVector;
+    const std::size_t nPartBytes = detail::PART_BYTES[mnMeeting];
+    std::vector<std::size_t> oStreams;
+    for (std::size_t nVector = 0; nVector < nVectors; ++nVector)
+    {
+        moFirstTerms.push_back(moTerms.size());
+        oStreams.clear();
+        for (std::size_t nByte = nVector * mnVector; nByte < (nVector + 1) * mnVector; nByte += nPartBytes)
+        {
+            const Part& oPart = moParts[nByte % mnMergedBytes / nPartBytes];
+            if (oPart.mnBytes != 0 && std::find(oStreams.begin(), oStreams.end(), oPart.mnStream) == oStreams.end())
+                oStreams.push_back(oPart.mnStream);
+        }
+        for (const std::size_t nStream : oStreams)
+            AddTerms(nVector, nStream);
+    }
+    moFirstTerms.push_back(moTerms.size());
+    moVectorTerms.reserve(moTerms.size());
+    for (const Term& oTerm : moTerms)
+    {
+        Stream& oStream = moStreams[oTerm.mnStream];
+        oStream.mnReach = std::max(oStream.mnReach, oTerm.mnOffset + detail::LOAD_BYTES);
+        moVectorTerms.push_back({nullptr, mnPeriodPixels * oStream.mnBytes, oTerm.moShuffle});
+    }
+}
+
+// Each load begins at the first byte that is still missing; bytes that one load gives lie no more than a vector apart.
+void Merger::Plan::AddTerms(std::size_t nVector, std::size_t nStream)
+{
+    const std::size_t nPartBytes = detail::PART_BYTES[mnMeeting];
+    std::size_t oFrom[MAX_VECTOR]; // for each byte its place in the stream
+    std::size_t nFirst = 0;
+    for (std::size_t nByte = 0; nByte < mnVector; ++nByte)
+    {
+        const std::size_t nAt = nVector * mnVector + nByte;
+        const Part& oPart = moParts[nAt % mnMergedBytes / nPartBytes];
+        const bool bMine = oPart.mnStream == nStream && nAt % nPartBytes < oPart.mnBytes;
+        oFrom[nByte] = bMine ? nAt / mnMergedBytes * moStreams[nStream].mnBytes + oPart.mnOffset + nAt % nPartBytes
+                             : std::numeric_limits<std::size_t>::max();
+    }
+    while ((nFirst = *std::min_element(oFrom, oFrom + mnVector)) != std::numeric_limits<std::size_t>::max())
+    {
+        Term oTerm = {nStream, nFirst, {}};
+        for (std::size_t nByte = 0; nByte < mnVector; ++nByte)
+        {
+            const bool bInside = oFrom[nByte] - nFirst < detail::LOAD_BYTES;
+            oTerm.moShuffle[nByte] = bInside ? static_cast<unsigned char>(oFrom[nByte] - nFirst) : 0x80;
+            if (bInside)
+                oFrom[nByte] = std::numeric_limits<std::size_t>::max();
+        }
+        moTerms.push_back(oTerm);
+    }
+}
+
+void Merger::Plan::MakeScratch()
+{
+    std::uint64_t nPixelBytes = mnTargetBytes + mnMergedBytes;
+    for (const Stream& oStream : moStreams)
+        nPixelBytes += oStream.mnBytes;
+    mnBlockPixels = std::max<std::uint64_t>(BLOCK_BYTES / nPixelBytes / BLOCK_STEP * BLOCK_STEP, MAX_VECTOR);
+
+    const auto nAligned = [this](std::size_t nBytes) // and room for a load at the last byte
+    {
+        return (mnBlockPixels * nBytes + detail::LOAD_BYTES + 63) / 64 * 64;
+    };
+    std::uint64_t nBytes = nAligned(mnMergedBytes);
+    for (const Stream& oStream : moStreams)
+        nBytes += oStream.mpConvert != nullptr ? nAligned(oStream.mnBytes) : 0;
+    mpoScratch = std::make_unique_for_overwrite<unsigned char[]>(nBytes);
+    mpMerged = mpoScratch.get();
+    unsigned char* pNext = mpMerged + nAligned(mnMergedBytes);
+    for (Stream& oStream : moStreams)
+    {
+        if (oStream.mpConvert == nullptr)
+            continue;
+        oStream.mpScratch = pNext;
+        pNext += nAligned(oStream.mnBytes);
+    }
+}
+
+void Merger::Plan::Run(const std::vector<const unsigned char*>& oSources, unsigned char* pTarget, std::uint64_t nPixels)
+{
+    if (nPixels == 0 || moParts.empty())
+        return;
+    if (mbIdentity)
+        return moStreams.front().mpConvert(oSources.front(), pTarget, nPixels * moParts.size());
+    for (std::uint64_t nFirst = 0; nFirst < nPixels; nFirst += mnBlockPixels)
+    {
+        const auto nCount = static_cast<std::size_t>(std::min(mnBlockPixels, nPixels - nFirst));
+        PrepareStreams(oSources, nFirst, nPixels, nCount);
+        MergeBlock(pTarget + nFirst * mnTargetBytes, nCount);
+    }
+}
+
+void Merger::Plan::MergeBlock(unsigned char* pTarget, std::size_t nPixels)
+{
+    const detail::MergeLoop pDirect = moKernels.GetMerge(mnMeeting, moTarget.mnPart);
+    const detail::MergeLoop pPlain = moKernels.GetMerge(mnMeeting, mnMeeting);
+    const detail::Converter pFinish = moKernels.GetConverter(mnMeeting, moTarget.mnPart);
+    std::size_t nDone = 0;
+    std::size_t nMerged = 0;
+    if (pDirect != nullptr)
+        nMerged = nDone = MergePeriods(pDirect, pTarget, mnTargetBytes, nPixels);
+    else if (pPlain != nullptr)
+        nMerged = MergePeriods(pPlain, mpMerged, mnMergedBytes, nPixels);
+    MergePixels(nMerged, nPixels);
+    pFinish(mpMerged + nDone * mnMergedBytes, pTarget + nDone * mnTargetBytes, (nPixels - nDone) * moParts.size());
+}
+
+void Merger::Plan::PrepareStreams(const std::vector<const unsigned char*>& oSources, std::uint64_t nFirst,
+                                  std::uint64_t nPixels, std::size_t nCount)
+{
+    for (std::size_t nStream = 0; nStream < moStreams.size(); ++nStream)
+    {
+        Stream& oStream = moStreams[nStream];
+        oStream.mpBlock = oSources[nStream] + nFirst * oStream.mnSourceBytes;
+        oStream.mnAvailable = (nPixels - nFirst) * oStream.mnBytes;
+        if (oStream.mpConvert == nullptr || oStream.mnReach == 0)
+            continue;
+        oStream.mpConvert(oStream.mpBlock, oStream.mpScratch, nCount * oStream.mnParts);
+        oStream.mpBlock = oStream.mpScratch;
+        oStream.mnAvailable = nCount * oStream.mnBytes + detail::LOAD_BYTES;
+    }
+}
+
+// The whole periods whose loads stay within the streams; returns the number of pixels done.
+std::size_t Merger::Plan::MergePeriods(detail::MergeLoop pMerge, unsigned char* pTarget, std::size_t nPixelBytes,
+                                       std::size_t nPixels)
+{
+    std::uint64_t nPeriods = nPixels / mnPeriodPixels;
+    for (const Stream& oStream : moStreams)
+    {
+        const std::uint64_t nStep = mnPeriodPixels * oStream.mnBytes;
+        if (oStream.mnReach > oStream.mnAvailable)
+            nPeriods = 0;
+        else if (oStream.mnReach != 0)
+            nPeriods = std::min(nPeriods, (oStream.mnAvailable - oStream.mnReach) / nStep + 1);
+    }
+    for (std::size_t nTerm = 0; nTerm < moTerms.size(); ++nTerm)
+        moVectorTerms[nTerm].mpSource = moStreams[moTerms[nTerm].mnStream].mpBlock + moTerms[nTerm].mnOffset;
+    const std::size_t nVectors = moFirstTerms.size() - 1;
+    const std::size_t nPeriodBytes = mnPeriodPixels * nPixelBytes;
+    for (std::size_t nVector = 0; nVector < nVectors; ++nVector)
+        pMerge(moVectorTerms.data() + moFirstTerms[nVector], moFirstTerms[nVector + 1] - moFirstTerms[nVector],
+               pTarget + nVector * (nPeriodBytes / nVectors), nPeriodBytes, static_cast<std::size_t>(nPeriods));
+    return static_cast<std::size_t>(nPeriods) * mnPeriodPixels;
+}
+
+void Merger::Plan::MergePixels(std::size_t nFirst, std::size_t nPixels)
+{
+    const std::size_t nPartBytes = detail::PART_BYTES[mnMeeting];
+    for (std::size_t nPixel = nFirst; nPixel < nPixels; ++nPixel)
+        for (std::size_t nPart = 0; nPart < moParts.size(); ++nPart)
+        {
+            const Part& oPart = moParts[nPart];
+            unsigned char* const pTo = mpMerged + nPixel * mnMergedBytes + nPart * nPartBytes;
+            std::memset(pTo, 0, nPartBytes);
+            if (oPart.mnBytes != 0)
+                std::memcpy(pTo,
+                            moStreams[oPart.mnStream].mpBlock + nPixel * moStreams[oPart.mnStream].mnBytes +
+                                oPart.mnOffset,
+                            oPart.mnBytes);
+        }
+}
+
+Merger::Merger(const std::vector<MergeSource>& oSources, BufferType eTarget, const std::vector<MergeChannel>& oChannels)
+    : mpoPlan(std::make_unique<Plan>(oSources, eTarget, oChannels))
+{
+}
+
+Merger::~Merger() = default;
+
+void Merger::Run(const std::vector<const unsigned char*>& oSources, unsigned char* pTarget, std::uint64_t nPixels)
+{
+    mpoPlan->Run(oSources, pTarget, nPixels);
+}
+
+} // namespace krv::raster

@@ -1,0 +1,51 @@
+#pragma once
+
+#include "toolkit/api.h"
+#include "toolkit/raster/copydata.h"
+
+#include <cstdint>
+#include <memory>
+#include <vector>
+
+namespace krv::raster
+{
+
+// A pixel-interleaved buffer without padding, from which a Merger takes channels.
+struct MergeSource
+{
+    BufferType meType = eBT_8U;
+    unsigned int mnChannels = 0;
+};
+
+// Where a channel of the result comes from; both count from 0.
+struct MergeChannel
+{
+    static constexpr unsigned int NOWHERE = ~0u; // as a source: the channel is 0
+
+    unsigned int mnSource = NOWHERE;
+    unsigned int mnChannel = 0;
+};
+
+// Makes one pixel-interleaved buffer of the channels of several, converted by the rules of CopyData, in one pass over
+// the result. What depends on the types and places alone is worked out once, by the constructor. One thread at a time.
+class KRV_TOOLKIT_API Merger
+{
+public:
+    // Throws ParameterException for an unknown type, DataException for a place that does not exist and for pixels of
+    // more than 2^31 - 1 bytes.
+    Merger(const std::vector<MergeSource>& oSources, BufferType eTarget, const std::vector<MergeChannel>& oChannels);
+    ~Merger();
+    Merger(const Merger&) = delete;
+    Merger& operator=(const Merger&) = delete;
+
+    // pSources: a buffer of nPixels pixels for each source, in their order; pTarget: nPixels pixels of all channels,
+    // every byte of which is written. Nothing need be aligned; buffers do not overlap.
+    void Run(const std::vector<const unsigned char*>& oSources, unsigned char* pTarget, std::uint64_t nPixels);
+
+private:
+    class Plan;
+
+    std::unique_ptr<Plan> mpoPlan;
+};
+
+} // namespace krv::raster
