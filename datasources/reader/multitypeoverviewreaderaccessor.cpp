@@ -48,6 +48,7 @@ unsigned int MultiTypeOverviewReaderAccessor::GetChanCount() const
 IRasterReader* MultiTypeOverviewReaderAccessor::CreateRasterReader(unsigned int nLevel)
 {
     std::vector<std::unique_ptr<IRasterReader>> oOwned;
+    oOwned.reserve(moReadChannels.size());
     for (const unsigned int nChannel : moReadChannels)
         oOwned.emplace_back(mpoLevels->CreateRasterReader(nLevel, {nChannel}));
     std::vector<IRasterReader*> oReaders;

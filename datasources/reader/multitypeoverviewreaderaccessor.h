@@ -27,7 +27,7 @@ public:
     bool IsLevelValid(unsigned int nLevel) const override;
     AuxiliaryData GetAuxiliaryData(unsigned int nLevel) override;
     unsigned int GetChanCount() const override;
-    // A MultiTypeReader over one reader per channel.
+    // A MultiTypeReader over one reader per channel, which places every channel at its own place.
     IRasterReader* CreateRasterReader(unsigned int nLevel) override;
 
 private:

@@ -14,12 +14,11 @@
 #include "toolkit/core/hmalloc.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
+#include "toolkit/raster/merger.h"
 
 #include <algorithm>
-#include <cstring>
 #include <exception>
 #include <map>
-#include <numeric>
 #include <utility>
 
 namespace krv::datasources
@@ -27,9 +26,6 @@ namespace krv::datasources
 
 namespace
 {
-
-// Pixels that are converted for all groups before the next ones: their part of the result stays in the cache.
-constexpr std::uint64_t BLOCK_PIXELS = 512;
 
 // Channels of one data type, read together.
 struct Group
@@ -52,34 +48,53 @@ struct FreeScratch
 };
 using Scratch = std::unique_ptr<unsigned char, FreeScratch>;
 
-// One run of adjacent channels that goes from a group's buffer into the result.
-struct Run
+// Where the channels of the result come from: a group counts as a source. Of two groups that are placed on one channel
+// the later one remains.
+std::vector<krv::raster::MergeChannel> PlaceChannels(const std::vector<Group>& oGroups, std::size_t nChannels,
+                                                     eChannelPlacement ePlacement)
 {
-    const unsigned char* mpSource;
-    krv::raster::BufferType meSource;
-    std::uint64_t mnSourceStride;
-    std::uint64_t mnSourcePixelBytes;
-    unsigned int mnTarget; // channel of the result
-    unsigned int mnChannels;
-};
-
-// Runs of positions without gaps; under eFromFirstPlace the whole group is one run.
-void AddRuns(const Group& oGroup, const unsigned char* pSource, eChannelPlacement ePlacement, std::vector<Run>& oRuns)
-{
-    const krv::gobs::DataType& oType = oGroup.mpoReader->GetDataType();
-    const auto eSource = krv::gobs::QRFDataType2RasterBufferType(oType);
-    const auto nCount = static_cast<unsigned int>(oGroup.moPositions.size());
-    const std::uint64_t nValueBytes = oType.GetValueBits() / 8;
-    const bool bWhole = oGroup.mbConsecutive || ePlacement == eFromFirstPlace;
-    for (unsigned int nFirst = 0; nFirst < nCount;)
+    std::vector<krv::raster::MergeChannel> oPlaced(nChannels);
+    for (unsigned int nGroup = 0; nGroup < oGroups.size(); ++nGroup)
     {
-        unsigned int nNext = bWhole ? nCount : nFirst + 1;
-        while (nNext < nCount && oGroup.moPositions[nNext] == oGroup.moPositions[nNext - 1] + 1)
-            ++nNext;
-        oRuns.push_back({pSource + nFirst * nValueBytes, eSource, nCount, nCount * nValueBytes,
-                         oGroup.moPositions[nFirst], nNext - nFirst});
-        nFirst = nNext;
+        const std::vector<unsigned int>& oPositions = oGroups[nGroup].moPositions;
+        const bool bSideBySide = !oGroups[nGroup].mbConsecutive && ePlacement == eFromFirstPlace;
+        for (unsigned int nChannel = 0; nChannel < oPositions.size(); ++nChannel)
+            oPlaced[bSideBySide ? oPositions.front() + nChannel : oPositions[nChannel]] = {nGroup, nChannel};
     }
+    return oPlaced;
+}
+
+krv::raster::MergeSource AsSource(const Group& oGroup)
+{
+    return {krv::gobs::QRFDataType2RasterBufferType(oGroup.mpoReader->GetDataType()),
+            static_cast<unsigned int>(oGroup.moPositions.size())};
+}
+
+// Does something with every group, so that all end in the same state, and when only some can, has the others undo it.
+// The first failure passes afterwards.
+template <typename Operation, typename Undo>
+void InStep(const std::vector<Group>& oGroups, const Operation& oOperation, const Undo& oUndo)
+{
+    std::exception_ptr oFailure;
+    std::size_t nFailed = 0;
+    for (const Group& oGroup : oGroups)
+    {
+        try
+        {
+            oOperation(*oGroup.mpoReader);
+        }
+        catch (...)
+        {
+            ++nFailed;
+            if (oFailure == nullptr)
+                oFailure = std::current_exception();
+        }
+    }
+    if (oFailure == nullptr)
+        return;
+    for (std::size_t nGroup = 0; nGroup < oGroups.size() && nFailed < oGroups.size(); ++nGroup)
+        oUndo(*oGroups[nGroup].mpoReader);
+    std::rethrow_exception(oFailure);
 }
 
 } // namespace
@@ -106,16 +121,20 @@ struct MultiTypeReader::State
     krv::gobs::TileIterator moTiles{0, 0};
     eChannelPlacement mePlacement = eFromFirstPlace;
     bool mbOwnsDataset = false;
-    bool mbOverviewsDisabled = false;
+    bool mbOverviewsDisabled = false;               // the readers were ready-made
+    std::unique_ptr<krv::raster::Merger> mpoMerger; // made by the first reading
 };
 
-MultiTypeReader::MultiTypeReader() : mpoState(std::make_unique<State>()) {}
+MultiTypeReader::MultiTypeReader() : mpoState(std::make_shared<State>()) {}
+
+MultiTypeReader::MultiTypeReader(const MultiTypeReader&) = default;
 
 MultiTypeReader::MultiTypeReader(const std::string& fileName, const std::vector<unsigned int>& oChannels,
                                  eChannelPlacement ePlacement)
     : MultiTypeReader()
 {
     OpenFile(fileName, oChannels, ePlacement, Place::Current());
+    WarnOfLoss(mpoState->moType, Place::Current());
 }
 
 MultiTypeReader::MultiTypeReader(const std::string& fileName, const std::vector<unsigned int>& oChannels,
@@ -131,6 +150,7 @@ MultiTypeReader::MultiTypeReader(IDataset* poDataset, const std::vector<unsigned
     : MultiTypeReader()
 {
     UseDataset(poDataset, oChannels, ePlacement, Place::Current());
+    WarnOfLoss(mpoState->moType, Place::Current());
 }
 
 MultiTypeReader::MultiTypeReader(IDataset* poDataset, const std::vector<unsigned int>& oChannels,
@@ -146,6 +166,7 @@ MultiTypeReader::MultiTypeReader(IDataset* poDataset, const std::vector<IRasterR
     : MultiTypeReader()
 {
     UseReaders(poDataset, oReaders, oChannels, Place::Current());
+    WarnOfLoss(mpoState->moType, Place::Current());
 }
 
 MultiTypeReader::MultiTypeReader(IDataset* poDataset, const std::vector<IRasterReader*>& oReaders,
@@ -212,6 +233,7 @@ void MultiTypeReader::UseReaders(IDataset* poDataset, const std::vector<IRasterR
                                  const std::vector<unsigned int>& oChannels, const Place& oPlace)
 {
     std::vector<Group> oGroups;
+    oGroups.reserve(oReaders.size());
     for (unsigned int nPosition = 0; nPosition < oReaders.size(); ++nPosition)
         oGroups.push_back({std::unique_ptr<IRasterReader>(oReaders[nPosition]), {nPosition}, true});
 
@@ -259,13 +281,21 @@ void MultiTypeReader::Settle()
 
 void MultiTypeReader::RequestType(const krv::gobs::DataType& oType, const Place& oPlace)
 {
-    if (oType == mpoState->moType)
-        return;
-    static_cast<void>(krv::gobs::QRFDataType2RasterBufferType(oType)); // refuses what nothing can be converted to
-    if (oType < mpoState->moType)
+    if (oType != mpoState->moType)
+        static_cast<void>(krv::gobs::QRFDataType2RasterBufferType(oType)); // refuses what nothing can be converted to
+    WarnOfLoss(oType, oPlace);
+    mpoState->moType = oType;
+}
+
+// Types that order before the promoted one lose something as a rule, and the warning does not look further.
+void MultiTypeReader::WarnOfLoss(const krv::gobs::DataType& oType, const Place& oPlace) const
+{
+    const bool bExact =
+        std::all_of(mpoState->moGroups.begin(), mpoState->moGroups.end(),
+                    [&](const Group& oGroup) { return krv::gobs::IsLossless(oGroup.mpoReader->GetDataType(), oType); });
+    if (!bExact || oType < mpoState->moType)
         krv::nspio::Warning::Warn("Lost of information possible due to data type promotion provided by this reader.",
                                   oPlace.GetSourceFile(), oPlace.GetLine());
-    mpoState->moType = oType;
 }
 
 krv::gobs::Raster* MultiTypeReader::GetRaster(unsigned int nIndex)
@@ -301,7 +331,7 @@ void MultiTypeReader::ReadRaster(krv::gobs::Raster* poRaster)
         ReadGroups(*poRaster);
 }
 
-// Every group is read into one scratch block; then the result is made block by block from all of them.
+// Every group is read into one scratch block; then the result is made from all of them in one pass.
 void MultiTypeReader::ReadGroups(krv::gobs::Raster& oRaster)
 {
     std::vector<std::uint64_t> oOffsets;
@@ -315,8 +345,7 @@ void MultiTypeReader::ReadGroups(krv::gobs::Raster& oRaster)
     }
     const Scratch oScratch(static_cast<unsigned char*>(HMalloc(nScratchBytes)));
 
-    std::vector<Run> oRuns;
-    unsigned int nPlaced = 0;
+    std::vector<const unsigned char*> oSources;
     for (std::size_t nGroup = 0; nGroup < mpoState->moGroups.size(); ++nGroup)
     {
         const Group& oGroup = mpoState->moGroups[nGroup];
@@ -326,26 +355,23 @@ void MultiTypeReader::ReadGroups(krv::gobs::Raster& oRaster)
                                           oGroup.mpoReader->GetDataType());
         krv::gobs::Raster oPart(oInfo, oRaster.GetContext(), pPart, false);
         oGroup.mpoReader->ReadRaster(&oPart);
-        AddRuns(oGroup, pPart, mpoState->mePlacement, oRuns);
-        nPlaced += oGroup.mbConsecutive || mpoState->mePlacement == eOwnPlace
-                       ? static_cast<unsigned int>(oGroup.moPositions.size())
-                       : 0;
+        oSources.push_back(pPart);
     }
-    if (nPlaced != GetChansCount())
-        std::memset(oRaster.GetBuffer(), 0, oRaster.GetBufferSize()); // not every channel is placed on
+    GetMerger().Run(oSources, oRaster.GetBuffer(), oRaster.GetFullWidth() * oRaster.GetFullHeight());
+}
 
-    const auto eTarget = krv::gobs::QRFDataType2RasterBufferType(mpoState->moType);
-    const std::uint64_t nValueBytes = mpoState->moType.GetValueBits() / 8;
-    const std::uint64_t nChannels = GetChansCount();
-    const std::uint64_t nPixels = oRaster.GetFullWidth() * oRaster.GetFullHeight();
-    for (std::uint64_t nFirst = 0; nFirst < nPixels; nFirst += BLOCK_PIXELS)
+krv::raster::Merger& MultiTypeReader::GetMerger()
+{
+    if (mpoState->mpoMerger == nullptr)
     {
-        const std::uint64_t nCount = std::min(BLOCK_PIXELS, nPixels - nFirst);
-        for (const Run& oRun : oRuns)
-            krv::raster::CopyData(oRun.mpSource + nFirst * oRun.mnSourcePixelBytes, oRun.meSource, oRun.mnSourceStride,
-                                  oRaster.GetBuffer() + (nFirst * nChannels + oRun.mnTarget) * nValueBytes, eTarget,
-                                  nChannels, nCount, oRun.mnChannels);
+        std::vector<krv::raster::MergeSource> oSources;
+        for (const Group& oGroup : mpoState->moGroups)
+            oSources.push_back(AsSource(oGroup));
+        mpoState->mpoMerger = std::make_unique<krv::raster::Merger>(
+            oSources, krv::gobs::QRFDataType2RasterBufferType(mpoState->moType),
+            PlaceChannels(mpoState->moGroups, mpoState->moChannels.size(), mpoState->mePlacement));
     }
+    return *mpoState->mpoMerger;
 }
 
 RasterIterator MultiTypeReader::FindRaster(unsigned int nX, unsigned int nY)
@@ -375,32 +401,38 @@ void MultiTypeReader::SetOptimalTileSize()
     SetTileSize(oFirst.GetTileWidth(), oFirst.GetTileHeight());
 }
 
-// A size that the grid refuses changes no group.
 void MultiTypeReader::SetTileSize(unsigned int nWidth, unsigned int nHeight)
 {
-    mpoState->moTiles.SetChunkSize(nWidth, nHeight);
-    for (const Group& oGroup : mpoState->moGroups)
-        oGroup.mpoReader->SetTileSize(nWidth, nHeight);
+    krv::gobs::TileIterator oTiles = mpoState->moTiles;
+    oTiles.SetChunkSize(nWidth, nHeight); // a size that the grid refuses changes no group
+    const unsigned int nOldWidth = GetTileWidth();
+    const unsigned int nOldHeight = GetTileHeight();
+    const auto oSet = [=](IRasterReader& oReader)
+    {
+        oReader.SetTileSize(nWidth, nHeight);
+    };
+    const auto oUndo = [=](IRasterReader& oReader)
+    {
+        oReader.SetTileSize(nOldWidth, nOldHeight);
+    };
+    InStep(mpoState->moGroups, oSet, oUndo);
+    mpoState->moTiles = oTiles;
 }
 
-// Every group takes the call, so that all end in the same state; the first failure passes afterwards.
 void MultiTypeReader::SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour)
 {
-    std::exception_ptr oFailure;
-    for (const Group& oGroup : mpoState->moGroups)
+    const unsigned int nOldX = GetXMargin();
+    const unsigned int nOldY = GetYMargin();
+    const eMarginBehaviour eOld = GetMarginBehaviour();
+    const auto oSet = [=](IRasterReader& oReader)
     {
-        try
-        {
-            oGroup.mpoReader->SetMargins(nXMargin, nYMargin, eBehaviour);
-        }
-        catch (...)
-        {
-            if (oFailure == nullptr)
-                oFailure = std::current_exception();
-        }
-    }
-    if (oFailure != nullptr)
-        std::rethrow_exception(oFailure);
+        oReader.SetMargins(nXMargin, nYMargin, eBehaviour);
+    };
+    const auto oUndo = [=](IRasterReader& oReader)
+    {
+        oReader.SetMargins(nOldX, nOldY, eOld);
+    };
+    InStep(mpoState->moGroups, oSet, oUndo);
 }
 
 IOverviewReaderAccessor* MultiTypeReader::GetOverviewReaderAccessor()
@@ -413,7 +445,18 @@ IOverviewReaderAccessor* MultiTypeReader::GetOverviewReaderAccessor()
 
 AuxiliaryData MultiTypeReader::GetAuxiliaryData() const
 {
-    return detail::SelectChannelData(*mpoState->mpoDataset, mpoState->moChannels);
+    if (!mpoState->mbOverviewsDisabled)
+        return detail::SelectChannelData(*mpoState->mpoDataset, mpoState->moChannels);
+    AuxiliaryData oData(GetChansCount());
+    oData.SetFileMetadata(mpoState->mpoDataset->ReadAuxiliaryData().GetFileMetadata());
+    for (const Group& oGroup : mpoState->moGroups)
+    {
+        const AuxiliaryData oOwn = oGroup.mpoReader->GetAuxiliaryData();
+        const unsigned int nChannel = oGroup.moPositions.front() + 1;
+        oData.SetChanMetadata(oOwn.GetChanMetadata(1), nChannel);
+        oData.SetChannelDescription(oOwn.GetChannelDescription(1), nChannel);
+    }
+    return oData;
 }
 
 unsigned int MultiTypeReader::GetTileWidth() const

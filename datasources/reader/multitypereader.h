@@ -8,6 +8,11 @@
 #include <string>
 #include <vector>
 
+namespace krv::raster
+{
+class Merger;
+}
+
 namespace krv::datasources
 {
 
@@ -27,14 +32,16 @@ enum eChannelPlacement
 };
 
 // Serves channels of different data types as one image of a single type: the promoted type of all channels or a
-// requested one. Channels of one type are read together; each group is converted and placed in the result.
+// requested one. Channels of one type are read together; all groups are converted and placed in the result in one pass.
+// A constructor warns when the type does not hold the values of every channel exactly, and when a requested type orders
+// before the promoted one. Readers of the groups stay in step: a setting that some of them refuse changes none.
 class KRV_DATASOURCES_API MultiTypeReader : public IRasterReader
 {
 public:
     // Channels of a file, from 1. An empty list is a DataException here, intended: a mixed file has no natural list.
     MultiTypeReader(const std::string& fileName, const std::vector<unsigned int>& oChannels,
                     eChannelPlacement ePlacement = eFromFirstPlace);
-    // The same in a requested type; warns when that type orders before the promoted one.
+    // The same in a requested type. Throws ParameterException for a type that values cannot be converted to.
     MultiTypeReader(const std::string& fileName, const std::vector<unsigned int>& oChannels,
                     const krv::gobs::DataType& oType, eChannelPlacement ePlacement = eFromFirstPlace);
     // Channels of a dataset that stays the caller's and outlives the reader.
@@ -43,13 +50,15 @@ public:
     MultiTypeReader(IDataset* poDataset, const std::vector<unsigned int>& oChannels, const krv::gobs::DataType& oType,
                     eChannelPlacement ePlacement = eFromFirstPlace);
     // Ready-made readers of one channel each and of one size, reader n for channel n of the result; they are taken
-    // over, also when the constructor throws. The dataset answers for metadata, of the listed channels, and for format,
-    // reference system and geocoding. There are no overviews.
+    // over, also when the constructor throws. They answer for the metadata of their channels, the first of them, in the
+    // order of types, for format, reference system and geocoding, and the dataset for the metadata of the file. The
+    // channel numbers are only kept. There are no overviews.
     MultiTypeReader(IDataset* poDataset, const std::vector<IRasterReader*>& oReaders,
                     const std::vector<unsigned int>& oChannels);
     MultiTypeReader(IDataset* poDataset, const std::vector<IRasterReader*>& oReaders,
                     const std::vector<unsigned int>& oChannels, const krv::gobs::DataType& oType);
-    MultiTypeReader(const MultiTypeReader&) = delete;
+    // A copy shares readers, settings and dataset with the original; the last of them releases what is owned.
+    MultiTypeReader(const MultiTypeReader& oOther);
     MultiTypeReader& operator=(const MultiTypeReader&) = delete;
     ~MultiTypeReader() override;
 
@@ -97,9 +106,11 @@ private:
                     const std::vector<unsigned int>& oChannels, const krv::Place& oPlace);
     void Settle();
     void RequestType(const krv::gobs::DataType& oType, const krv::Place& oPlace);
+    void WarnOfLoss(const krv::gobs::DataType& oType, const krv::Place& oPlace) const;
     void ReadGroups(krv::gobs::Raster& oRaster);
+    krv::raster::Merger& GetMerger();
 
-    std::unique_ptr<State> mpoState;
+    std::shared_ptr<State> mpoState;
 };
 
 } // namespace krv::datasources

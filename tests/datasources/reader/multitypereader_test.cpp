@@ -1,6 +1,7 @@
 #include "datasources/reader/multitypereader.h"
 
 #include "datasources/reader/defaultreader.h"
+#include "datasources/reader/exacthaloreader.h"
 #include "datasources/reader/multitypeoverviewreaderaccessor.h"
 #include "tests/datasources/reader/readertest.h"
 #include "tests/support/outputcapture.h"
@@ -94,6 +95,7 @@ TEST_F(MultiTypeReaderTest, TypesArePromotedOrRequestedWithAWarning)
     OutputCapture oOutput;
     EXPECT_EQ(MultiTypeReader(dataset.get(), {1, 2}, krv::gobs::eDT_32R).GetDataType(), DataType(krv::gobs::eDT_32R));
     EXPECT_TRUE(oOutput.moWarnings.empty());
+    EXPECT_EQ(MultiTypeReader(dataset.get(), {1, 2, 3}).GetAuxiliaryData().GetChannelDescription(3), "channel 3");
     EXPECT_EQ(MultiTypeReader(dataset.get(), {2, 1}, krv::gobs::eDT_8U).GetDataType(), DataType(krv::gobs::eDT_8U));
     ASSERT_EQ(oOutput.moWarnings.size(), 1u);
     EXPECT_EQ(oOutput.moWarnings[0].moMessage,
@@ -149,6 +151,48 @@ TEST_F(MultiTypeReaderTest, LevelsAndReadyMadeReadersMakeOneImage)
         std::memcpy(&nValue, wide.data() + 2 * nPixel, 2);
         ASSERT_EQ(oSecond[nPixel], nValue);
     }
+}
+
+// Refuses a tile width of 13.
+class FussyReader : public BasicReader
+{
+public:
+    using BasicReader::BasicReader;
+    void SetTileSize(unsigned int nWidth, unsigned int nHeight) override
+    {
+        if (nWidth == 13)
+            throw krv::DataException("not that one");
+        BasicReader::SetTileSize(nWidth, nHeight);
+    }
+};
+
+// Readers that are made elsewhere refuse different things; what some refuse changes none.
+TEST_F(MultiTypeReaderTest, GroupsStayInStep)
+{
+    const auto dataset = MakeDataset();
+    auto oWide = std::make_unique<krv::datasources::ExactHaloReader>(new BasicReader(moFile, Channels{1}), true);
+    auto oNarrow = std::make_unique<FussyReader>(moFile, Channels{2});
+    IRasterReader* const oReaders[] = {oWide.get(), oNarrow.get()};
+    MultiTypeReader oReader(dataset.get(), {oWide.release(), oNarrow.release()}, {5, 9});
+    oReader.SetMargins(2, 1, eReplicate);
+    oReader.SetTileSize(9, 7);
+    EXPECT_NE(Error([&] { oReader.SetMargins(5000, 5000, eMirror); }), "");
+    EXPECT_NE(Error([&] { oReader.SetTileSize(13, 7); }), "");
+    for (const IRasterReader* const poReader : {oReaders[0], oReaders[1], static_cast<IRasterReader*>(&oReader)})
+    {
+        EXPECT_EQ(poReader->GetXMargin(), 2u);
+        EXPECT_EQ(poReader->GetYMargin(), 1u);
+        EXPECT_EQ(poReader->GetMarginBehaviour(), eReplicate);
+        EXPECT_EQ(poReader->GetTileWidth(), 9u);
+        EXPECT_EQ(poReader->GetTileHeight(), 7u);
+    }
+    EXPECT_EQ(oReader.GetTileCount(), oReaders[0]->GetTileCount());
+    // Metadata come from where the pixels do, whatever the numbers are.
+    EXPECT_EQ(oReader.GetAuxiliaryData().GetFileMetadataValue("scene"), "alps");
+    EXPECT_EQ(oReader.GetAuxiliaryData().GetChanMetadataValue("band", 2), "b2");
+    EXPECT_EQ(oReader.GetAuxiliaryData().GetChannelDescription(1), "channel 1");
+    const MultiTypeReader oCopy(oReader);
+    EXPECT_EQ(oCopy.GetChannelsInfo(), oReader.GetChannelsInfo());
 }
 
 // Nothing is left behind by a failure at any call, through the reader that is chosen and through the fallback.
