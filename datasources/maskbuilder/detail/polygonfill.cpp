@@ -1,0 +1,359 @@
+#include "datasources/maskbuilder/detail/polygonfill.h"
+
+#include <algorithm>
+#include <array>
+#include <cmath>
+#include <limits>
+
+#ifdef __SSE4_1__
+#include <immintrin.h>
+#endif
+
+namespace krv::datasources::detail
+{
+
+namespace
+{
+
+constexpr int BLOCK_ROWS = 64;
+// Rows whose two planes are to stay in the nearest cache.
+constexpr int DENSE_ROWS = 32;
+// Crossings in a row from which on sorting them costs more than two planes.
+constexpr std::uint64_t MANY_CROSSINGS = 64;
+// Wider areas would need planes beyond the caches.
+constexpr std::int64_t WIDEST_PLANE = 1 << 20;
+constexpr std::size_t SHORT_LIST = 24;
+
+std::int64_t Truncated(double nValue)
+{
+    return static_cast<std::int64_t>(std::clamp(nValue, -9e18, 9e18));
+}
+
+void SortCrossings(double* pFirst, std::size_t nCount)
+{
+    if (nCount > SHORT_LIST)
+    {
+        std::sort(pFirst, pFirst + nCount);
+        return;
+    }
+    for (std::size_t i = 1; i < nCount; ++i)
+    {
+        const double nValue = pFirst[i];
+        std::size_t k = i;
+        for (; k > 0 && pFirst[k - 1] > nValue; --k)
+            pFirst[k] = pFirst[k - 1];
+        pFirst[k] = nValue;
+    }
+}
+
+// The part of the area that a polygon can reach.
+PixelArea Narrowed(PixelArea oArea, const GGLPolyRaster& oPolygon)
+{
+    oArea.firstRow = std::max<std::int64_t>(oArea.firstRow, oPolygon.GetFirstRow());
+    oArea.lastRow = std::min<std::int64_t>(oArea.lastRow, oPolygon.GetLastRow());
+    const double nFarthest = std::max(std::fabs(oPolygon.GetLeft()), std::fabs(oPolygon.GetRight()));
+    const double nRounding = 2 + nFarthest * 1e-9;
+    oArea.lastColumn = std::min(oArea.lastColumn, Truncated(oPolygon.GetRight() + nRounding));
+    // Columns up to 0 keep their own rule, so the area never begins at 0 unless it did or nothing is left of it.
+    const std::int64_t nLeft = Truncated(oPolygon.GetLeft() - nRounding);
+    if (nLeft > 0)
+        oArea.firstColumn = std::max(oArea.firstColumn, nLeft);
+    return oArea;
+}
+
+// The rows of a block that an edge crosses.
+struct EdgeRows
+{
+    EdgeRows(const GGLPolyRaster::Edge& oEdge, int nFirstRow, int nLastRow)
+        : first(std::max(oEdge.firstRow, nFirstRow)), last(std::min(oEdge.lastRow, nLastRow))
+    {
+    }
+    int first;
+    int last;
+};
+
+constexpr std::array<std::array<std::uint64_t, 2>, 64> MakeBitMasks()
+{
+    std::array<std::array<std::uint64_t, 2>, 64> oMasks{};
+    for (std::size_t i = 0; i < 64; ++i)
+        oMasks[i] = {std::uint64_t{1} << (63 - i), 0};
+    return oMasks;
+}
+
+// A pair of planes with one bit of the first set, for each of its 64.
+alignas(16) constexpr std::array<std::array<std::uint64_t, 2>, 64> BIT_MASKS = MakeBitMasks();
+
+// Flips the bits of edges in the planes of a dense block: column c of the area has the bit c + 64, all that lies left
+// of the area is bit 63, and all that lies right of it the one behind its last. The crossings are those of Edge::At;
+// where they are below 0 the bits are some of these all the same.
+class BitFlipper
+{
+public:
+    BitFlipper(std::int64_t nFirstColumn, std::int64_t nLastColumn, PolygonFill::Planes* pPlanes, std::size_t nRowWords)
+        : mnFirst(static_cast<std::int32_t>(nFirstColumn)),
+          mnLowest(static_cast<double>(std::max<std::int64_t>(nFirstColumn - 1, 0))),
+          mnHighest(static_cast<double>(nLastColumn + 1)), mpPlanes(pPlanes), mnRowWords(nRowWords)
+    {
+    }
+
+    // Rows nFirst to nLast, counted from the block's first.
+    void Flip(const GGLPolyRaster::Edge& oEdge, int nBlockRow, int nFirst, int nLast) const
+    {
+        Bits oBits;
+        FindBits(oEdge, nBlockRow, nFirst / 4 * 4, nLast, oBits);
+        auto* pRow = reinterpret_cast<unsigned char*>(mpPlanes + static_cast<std::size_t>(nFirst) * mnRowWords + 1);
+        const std::size_t nRowBytes = mnRowWords * sizeof(PolygonFill::Planes);
+        const auto nEnd = static_cast<std::size_t>(nLast) + 1;
+        auto k = static_cast<std::size_t>(nFirst);
+        for (; k + 2 <= nEnd; k += 2, pRow += 2 * nRowBytes)
+        {
+            FlipBit(pRow + oBits.places[k], oBits.masks[k]);
+            FlipBit(pRow + nRowBytes + oBits.places[k + 1], oBits.masks[k + 1]);
+        }
+        if (k < nEnd)
+            FlipBit(pRow + oBits.places[k], oBits.masks[k]);
+    }
+
+private:
+    // Where the bits of the rows lie: bytes from the row's first column, and bytes into the table of masks.
+    struct Bits
+    {
+        alignas(16) std::array<std::int32_t, DENSE_ROWS> places;
+        alignas(16) std::array<std::int32_t, DENSE_ROWS> masks;
+    };
+
+#ifdef __SSE4_1__
+    // By fours of rows; those beyond the edge are not looked at.
+    void FindBits(const GGLPolyRaster::Edge& oEdge, int nBlockRow, int nFirst, int nLast, Bits& oBits) const
+    {
+        const __m128d oX = _mm_set1_pd(oEdge.x), oSlope = _mm_set1_pd(oEdge.slope);
+        const __m128d oFrom = _mm_set1_pd(static_cast<double>(std::int64_t{nBlockRow} + nFirst - oEdge.firstRow));
+        __m128d oRows = _mm_add_pd(oFrom, _mm_set_pd(1, 0)), oNextRows = _mm_add_pd(oFrom, _mm_set_pd(3, 2));
+        const auto Columns = [&](__m128d oTwo)
+        {
+            const __m128d oCrossings = _mm_add_pd(oX, _mm_mul_pd(oTwo, oSlope));
+            const __m128d oHigh = _mm_max_pd(_mm_add_pd(oCrossings, _mm_set1_pd(0.5)), _mm_set1_pd(mnLowest));
+            return _mm_cvttpd_epi32(_mm_min_pd(oHigh, _mm_set1_pd(mnHighest)));
+        };
+        for (auto nRow = static_cast<std::size_t>(nFirst); nRow <= static_cast<std::size_t>(nLast); nRow += 4)
+        {
+            const __m128i oFour = _mm_unpacklo_epi64(Columns(oRows), Columns(oNextRows));
+            const __m128i oBit = _mm_sub_epi32(oFour, _mm_set1_epi32(mnFirst));
+            const __m128i oPlace = _mm_slli_epi32(_mm_srai_epi32(oBit, 6), 4);
+            const __m128i oMask = _mm_slli_epi32(_mm_and_si128(oBit, _mm_set1_epi32(63)), 4);
+            _mm_store_si128(reinterpret_cast<__m128i*>(&oBits.places[nRow]), oPlace);
+            _mm_store_si128(reinterpret_cast<__m128i*>(&oBits.masks[nRow]), oMask);
+            oRows = _mm_add_pd(oRows, _mm_set1_pd(4));
+            oNextRows = _mm_add_pd(oNextRows, _mm_set1_pd(4));
+        }
+    }
+
+    static void FlipBit(unsigned char* pPlanes, std::int32_t nMask)
+    {
+        const auto* const pMasks = reinterpret_cast<const unsigned char*>(BIT_MASKS.data());
+        const __m128i oBit = _mm_load_si128(reinterpret_cast<const __m128i*>(pMasks + nMask));
+        const __m128i oOld = _mm_loadu_si128(reinterpret_cast<const __m128i*>(pPlanes));
+        const __m128i oAgain = _mm_slli_si128(_mm_and_si128(oOld, oBit), 8);
+        _mm_storeu_si128(reinterpret_cast<__m128i*>(pPlanes), _mm_or_si128(_mm_xor_si128(oOld, oBit), oAgain));
+    }
+#else
+    void FindBits(const GGLPolyRaster::Edge& oEdge, int nBlockRow, int nFirst, int nLast, Bits& oBits) const
+    {
+        const auto nFrom = static_cast<double>(std::int64_t{nBlockRow} - oEdge.firstRow);
+        for (int nRow = nFirst; nRow <= nLast; ++nRow)
+        {
+            const double nColumn = oEdge.x + (nFrom + nRow) * oEdge.slope + 0.5;
+            const auto nBit = static_cast<std::int32_t>(std::min(std::max(nColumn, mnLowest), mnHighest)) - mnFirst;
+            oBits.places[static_cast<std::size_t>(nRow)] = (nBit >> 6) * 16;
+            oBits.masks[static_cast<std::size_t>(nRow)] = (nBit & 63) * 16;
+        }
+    }
+
+    static void FlipBit(unsigned char* pPlanes, std::int32_t nMask)
+    {
+        auto& oPlanes = *reinterpret_cast<PolygonFill::Planes*>(pPlanes);
+        const std::uint64_t nBit = BIT_MASKS[static_cast<std::size_t>(nMask) / 16][0];
+        oPlanes.again |= oPlanes.odd & nBit;
+        oPlanes.odd ^= nBit;
+    }
+#endif
+
+    std::int32_t mnFirst;
+    double mnLowest;
+    double mnHighest;
+    PolygonFill::Planes* mpPlanes;
+    std::size_t mnRowWords;
+};
+
+// The highest bit is the first: every bit becomes the exclusive-or of all up to it.
+std::uint64_t RunningXor(std::uint64_t n)
+{
+    n ^= n >> 1;
+    n ^= n >> 2;
+    n ^= n >> 4;
+    n ^= n >> 8;
+    n ^= n >> 16;
+    n ^= n >> 32;
+    return n;
+}
+
+} // namespace
+
+PolygonFill::PolygonFill(const MaskRows& oRows, const PixelArea& oArea) : moRows(oRows), moArea(oArea) {}
+
+void PolygonFill::Fill(const GGLPolyRaster& oPolygon)
+{
+    const PixelArea oWhole = moArea;
+    moArea = Narrowed(oWhole, oPolygon);
+    if (!moArea.IsEmpty())
+    {
+        for (std::int64_t nRow = moArea.firstRow; nRow <= moArea.lastRow; nRow += BLOCK_ROWS)
+            FillBlock(oPolygon, nRow, std::min(nRow + BLOCK_ROWS - 1, moArea.lastRow));
+    }
+    moArea = oWhole;
+}
+
+void PolygonFill::FillBlock(const GGLPolyRaster& oPolygon, std::int64_t nFirstRow, std::int64_t nLastRow)
+{
+    const auto nFirst = static_cast<int>(nFirstRow); // rows of a polygon are ints
+    const auto nLast = static_cast<int>(nLastRow);
+    oPolygon.FindEdges(nFirst, nLast, moEdges);
+    std::uint64_t nCrossings = 0;
+    for (const GGLPolyRaster::Edge& oEdge : moEdges)
+    {
+        const EdgeRows oRows(oEdge, nFirst, nLast);
+        nCrossings += static_cast<std::uint64_t>(oRows.last - oRows.first + 1);
+    }
+    const bool bMany = nCrossings > MANY_CROSSINGS * static_cast<std::uint64_t>(nLast - nFirst + 1);
+    const bool bPlanesFit = moArea.lastColumn >= 0 && moArea.lastColumn < std::numeric_limits<int>::max() &&
+                            moArea.lastColumn - moArea.firstColumn < WIDEST_PLANE;
+    if (bMany && bPlanesFit)
+    {
+        for (int nRow = nFirst; nRow <= nLast; nRow += DENSE_ROWS)
+            FillDense(oPolygon, nRow, std::min(nRow + DENSE_ROWS - 1, nLast));
+    }
+    else if (nCrossings > 0)
+        FillSparse(nFirst, nLast, nCrossings);
+}
+
+void PolygonFill::FillSparse(int nFirstRow, int nLastRow, std::uint64_t nCrossings)
+{
+    const auto nRows = static_cast<std::size_t>(nLastRow - nFirstRow + 1);
+    // First the change of the number from row to row, then the numbers, then where the list of each row begins.
+    std::array<std::ptrdiff_t, BLOCK_ROWS + 1> oPlaces{};
+    for (const GGLPolyRaster::Edge& oEdge : moEdges)
+    {
+        const EdgeRows oRows(oEdge, nFirstRow, nLastRow);
+        ++oPlaces[static_cast<std::size_t>(oRows.first - nFirstRow)];
+        --oPlaces[static_cast<std::size_t>(oRows.last - nFirstRow) + 1];
+    }
+    std::ptrdiff_t nInRow = 0, nPlace = 0;
+    for (std::size_t r = 0; r <= nRows; ++r)
+    {
+        nInRow += oPlaces[r];
+        oPlaces[r] = nPlace;
+        nPlace += nInRow;
+    }
+    const auto oBegins = oPlaces;
+    moCrossings.resize(nCrossings);
+    for (const GGLPolyRaster::Edge& oEdge : moEdges)
+    {
+        const EdgeRows oRows(oEdge, nFirstRow, nLastRow);
+        for (int nRow = oRows.first; nRow <= oRows.last; ++nRow)
+            moCrossings[static_cast<std::size_t>(oPlaces[static_cast<std::size_t>(nRow - nFirstRow)]++)] =
+                oEdge.At(nRow);
+    }
+    for (std::size_t r = 0; r < nRows; ++r)
+        FillRow(nFirstRow + static_cast<int>(r), moCrossings.data() + oBegins[r],
+                static_cast<std::size_t>(oBegins[r + 1] - oBegins[r]));
+}
+
+void PolygonFill::FillRow(int nRow, double* pCrossings, std::size_t nCount)
+{
+    SortCrossings(pCrossings, nCount);
+    const auto nFirst = static_cast<double>(moArea.firstColumn);
+    std::size_t i = 0;
+    while (i + 1 < nCount && pCrossings[i + 1] < nFirst)
+        i += 2;
+    for (; i + 1 < nCount; i += 2)
+    {
+        const std::int64_t nStart = Truncated(pCrossings[i] + 0.5);
+        if (nStart > moArea.lastColumn)
+            return;
+        const std::int64_t nEnd = std::max(nStart, Truncated(pCrossings[i + 1] - 0.5));
+        if (nEnd >= moArea.firstColumn)
+            moRows.SetRun(nRow, std::max(nStart, moArea.firstColumn), std::min(nEnd, moArea.lastColumn));
+    }
+}
+
+void PolygonFill::FillDense(const GGLPolyRaster& oPolygon, int nFirstRow, int nLastRow)
+{
+    const std::int64_t nWidth = moArea.lastColumn - std::max<std::int64_t>(moArea.firstColumn, 0) + 1;
+    mnRowWords = static_cast<std::size_t>(nWidth) / 64 + 2; // one bit right of the area is written too
+    moPlanes.resize(mnRowWords * DENSE_ROWS);               // all clear: TakeRow leaves them so
+    moWords.resize(mnRowWords);
+    moSpanRows.assign(DENSE_ROWS, false);
+    const bool bSpanRows = Flip(nFirstRow, nLastRow);
+    for (int nRow = nFirstRow; nRow <= nLastRow; ++nRow)
+    {
+        const auto r = static_cast<std::size_t>(nRow - nFirstRow);
+        Planes* const pRow = moPlanes.data() + r * mnRowWords;
+        if (!bSpanRows || !moSpanRows[r])
+        {
+            TakeRow(nRow, pRow);
+            continue;
+        }
+        std::fill_n(pRow, mnRowWords, Planes{});
+        oPolygon.GetScanline(nRow, moCrossings);
+        FillRow(nRow, moCrossings.data(), moCrossings.size());
+    }
+}
+
+// Flips the bits of a block's crossings. Returns whether there are rows to be filled span by span.
+bool PolygonFill::Flip(int nFirstRow, int nLastRow)
+{
+    const BitFlipper oFlipper(std::max<std::int64_t>(moArea.firstColumn, 0), moArea.lastColumn, moPlanes.data(),
+                              mnRowWords);
+    const bool bAtZero = moArea.firstColumn <= 0;
+    bool bSpanRows = false;
+    for (const GGLPolyRaster::Edge& oEdge : moEdges)
+    {
+        const EdgeRows oRows(oEdge, nFirstRow, nLastRow);
+        if (oRows.first > oRows.last)
+            continue;
+        if (bAtZero && std::min(oEdge.At(oRows.first), oEdge.At(oRows.last)) < 0)
+        {
+            bSpanRows = true;
+            for (int nRow = oRows.first; nRow <= oRows.last; ++nRow)
+            {
+                if (oEdge.At(nRow) < 0)
+                    moSpanRows[static_cast<std::size_t>(nRow - nFirstRow)] = true;
+            }
+        }
+        oFlipper.Flip(oEdge, nFirstRow, oRows.first - nFirstRow, oRows.last - nFirstRow);
+    }
+    return bSpanRows;
+}
+
+void PolygonFill::TakeRow(int nRow, Planes* pRow)
+{
+    const std::int64_t nFirstColumn = std::max<std::int64_t>(moArea.firstColumn, 0);
+    const auto nBits = static_cast<std::uint64_t>(moArea.lastColumn - nFirstColumn + 1);
+    const auto nWords = static_cast<std::size_t>((nBits + 63) / 64);
+    std::uint64_t nInside = 0 - (pRow[0].odd & 1);
+    pRow[0] = {};
+    for (std::size_t i = 0; i < nWords; ++i)
+    {
+        const std::uint64_t nRun = RunningXor(pRow[i + 1].odd) ^ nInside;
+        moWords[i] = nRun | pRow[i + 1].again;
+        nInside = 0 - (nRun & 1);
+        pRow[i + 1] = {};
+    }
+    if (nWords + 1 < mnRowWords)
+        pRow[nWords + 1] = {};
+    if (nBits % 64 != 0)
+        moWords[nWords - 1] &= ~std::uint64_t{0} << (64 - nBits % 64);
+    moRows.OrWords(nRow, nFirstColumn, moWords.data(), nBits);
+}
+
+} // namespace krv::datasources::detail

@@ -1,0 +1,255 @@
+#include "toolkit/core/gglpolyraster.h"
+
+#include "toolkit/core/gglshape.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <algorithm>
+#include <array>
+#include <cmath>
+#include <iterator>
+#include <limits>
+
+namespace
+{
+
+constexpr std::size_t BUNDLE = 16;
+constexpr double GREATEST = std::numeric_limits<double>::max();
+
+bool IsUsable(const GDBVertex& oVertex)
+{
+    return std::isfinite(oVertex.x) && std::isfinite(oVertex.y);
+}
+
+// The change of x per row. Differences of enormous coordinates leave the range of a double: their halves do not.
+double Slope(const GDBVertex& oUpper, const GDBVertex& oLower)
+{
+    double nX = oLower.x - oUpper.x;
+    double nY = oLower.y - oUpper.y;
+    if (!std::isfinite(nX) || !std::isfinite(nY))
+    {
+        nX = oLower.x / 2 - oUpper.x / 2;
+        nY = oLower.y / 2 - oUpper.y / 2;
+    }
+    return std::clamp(nX / nY, -GREATEST, GREATEST);
+}
+
+// How many bundles hold n edges, or n bundles.
+std::size_t BundleCount(std::size_t n)
+{
+    return (n + BUNDLE - 1) / BUNDLE;
+}
+
+} // namespace
+
+GGLPolyRaster::GGLPolyRaster(const GGLShape& oShape, int nFirstRow, int nRows)
+{
+    RowLimits oLimits;
+    if (nRows > 0)
+        oLimits = {nFirstRow, std::min(oLimits.last, std::int64_t{nFirstRow} + nRows - 1)};
+    const auto& oVertices = oShape.GetVertices();
+    const auto& oStarts = oShape.GetRingStarts();
+    for (std::size_t i = 0; i < oStarts.size(); ++i)
+    {
+        const std::size_t nEnd = i + 1 < oStarts.size() ? oStarts[i + 1] : oVertices.size();
+        AddRing(oVertices.data() + oStarts[i], oVertices.data() + nEnd, oLimits);
+    }
+    Finish();
+}
+
+GGLPolyRaster::GGLPolyRaster(const GDBVertex* poVertices, int nVertices, const int* pnRingStarts, int nRings, int nRows)
+{
+    const krv::Place oPlace = krv::Place::Current();
+    if (nVertices < 0 || nRings < 0)
+        throw krv::DataException("A polygon cannot have a negative number of vertices or rings", oPlace);
+    if ((poVertices == nullptr && nVertices > 0) || (pnRingStarts == nullptr && nRings > 0))
+        throw krv::DataException("The vertices or the ring starts of the polygon are NULL", oPlace);
+    RowLimits oLimits;
+    if (nRows > 0)
+        oLimits = {0, std::min(oLimits.last, std::int64_t{nRows} - 1)};
+    for (int i = 0; i < nRings; ++i)
+    {
+        const int nStart = pnRingStarts[i];
+        const int nEnd = i + 1 < nRings ? pnRingStarts[i + 1] : nVertices;
+        if (nStart < 0 || nStart > nEnd || nEnd > nVertices)
+            throw krv::DataException("The ring starts of the polygon are out of order or outside its vertices", oPlace);
+        AddRing(poVertices + nStart, poVertices + nEnd, oLimits);
+    }
+    Finish();
+}
+
+GGLPolyRaster::GGLPolyRaster(const GGLPolyRaster&) = default;
+GGLPolyRaster::GGLPolyRaster(GGLPolyRaster&&) noexcept = default;
+GGLPolyRaster& GGLPolyRaster::operator=(const GGLPolyRaster&) = default;
+GGLPolyRaster& GGLPolyRaster::operator=(GGLPolyRaster&&) noexcept = default;
+GGLPolyRaster::~GGLPolyRaster() = default;
+
+void GGLPolyRaster::AddRing(const GDBVertex* poFirst, const GDBVertex* poEnd, const RowLimits& oLimits)
+{
+    // The first row whose centre is not above a vertex, one beyond the last row at most.
+    const auto nLowest = static_cast<double>(oLimits.first);
+    const auto nHighest = static_cast<double>(oLimits.last + 1);
+    const auto RowOf = [nLowest, nHighest](const GDBVertex& oVertex)
+    {
+        return std::min(std::max(std::ceil(oVertex.y - 0.5), nLowest), nHighest);
+    };
+    if (poEnd - poFirst < 2)
+        return;
+    const std::size_t nEdges = moEdges.size();
+    const GDBVertex* poBefore = poEnd - 1;
+    double nBefore = RowOf(*poBefore);
+    // Most edges of fine outlines cross no row. Those that do are collected without a branch, then looked at.
+    std::array<const GDBVertex*, 512> oCrossing;
+    for (const GDBVertex* poVertex = poFirst; poVertex != poEnd;)
+    {
+        const GDBVertex* const poStop = poVertex + std::min<std::ptrdiff_t>(oCrossing.size(), poEnd - poVertex);
+        std::size_t nCount = 0;
+        for (; poVertex != poStop; ++poVertex)
+        {
+            const double nRow = RowOf(*poVertex);
+            oCrossing[nCount] = poVertex;
+            nCount += nRow == nBefore ? 0 : 1;
+            nBefore = nRow;
+        }
+        for (std::size_t i = 0; i < nCount; ++i)
+        {
+            const GDBVertex& oTo = *oCrossing[i];
+            const GDBVertex& oFrom = oCrossing[i] == poFirst ? *poBefore : *(oCrossing[i] - 1);
+            if (!IsUsable(oFrom) || !IsUsable(oTo))
+            {
+                moEdges.resize(nEdges);
+                AddUsable(poFirst, poEnd, oLimits);
+                return;
+            }
+            const auto nFrom = static_cast<std::int64_t>(RowOf(oFrom)), nTo = static_cast<std::int64_t>(RowOf(oTo));
+            // Downwards whatever the sense of the ring, so that neighbours agree on the edge between them.
+            if (nFrom < nTo)
+                AddEdge(oFrom, oTo, {nFrom, nTo - 1});
+            else
+                AddEdge(oTo, oFrom, {nTo, nFrom - 1});
+        }
+    }
+}
+
+// The ring without the vertices that are not usable, of which there are some.
+void GGLPolyRaster::AddUsable(const GDBVertex* poFirst, const GDBVertex* poEnd, const RowLimits& oLimits)
+{
+    std::vector<GDBVertex> oUsable;
+    std::copy_if(poFirst, poEnd, std::back_inserter(oUsable), IsUsable);
+    AddRing(oUsable.data(), oUsable.data() + oUsable.size(), oLimits);
+}
+
+void GGLPolyRaster::AddEdge(const GDBVertex& oUpper, const GDBVertex& oLower, const RowLimits& oRows)
+{
+    const double nSlope = Slope(oUpper, oLower);
+    const double nX = oUpper.x + (static_cast<double>(oRows.first) + 0.5 - oUpper.y) * nSlope;
+    const auto [nLow, nHigh] = std::minmax({oUpper.x, oLower.x});
+    moEdges.emplace_back(static_cast<int>(oRows.first), static_cast<int>(oRows.last), std::clamp(nX, nLow, nHigh),
+                         nSlope);
+}
+
+void GGLPolyRaster::Finish()
+{
+    if (moEdges.empty())
+        return;
+    mnFirstRow = std::numeric_limits<int>::max();
+    mnLastRow = std::numeric_limits<int>::min();
+    mnLeft = GREATEST;
+    mnRight = -GREATEST;
+    for (const Edge& oEdge : moEdges)
+    {
+        const double nEnd = oEdge.At(oEdge.lastRow);
+        mnFirstRow = std::min(mnFirstRow, oEdge.firstRow);
+        mnLastRow = std::max(mnLastRow, oEdge.lastRow);
+        mnLeft = std::min(mnLeft, std::min(oEdge.x, nEnd));
+        mnRight = std::max(mnRight, std::max(oEdge.x, nEnd));
+    }
+    mnLeft = std::max(mnLeft, -GREATEST);
+    mnRight = std::min(mnRight, GREATEST);
+    SortEdges();
+    moLastRows.emplace_back(BundleCount(moEdges.size()), std::numeric_limits<int>::min());
+    for (std::size_t i = 0; i < moEdges.size(); ++i)
+        moLastRows[0][i / BUNDLE] = std::max(moLastRows[0][i / BUNDLE], moEdges[i].lastRow);
+    while (moLastRows.back().size() > 1)
+    {
+        const std::vector<int>& oBelow = moLastRows.back();
+        std::vector<int> oAbove(BundleCount(oBelow.size()), std::numeric_limits<int>::min());
+        for (std::size_t i = 0; i < oBelow.size(); ++i)
+            oAbove[i / BUNDLE] = std::max(oAbove[i / BUNDLE], oBelow[i]);
+        moLastRows.push_back(std::move(oAbove));
+    }
+}
+
+// By counting where the rows are not many more than the edges, which is the rule.
+void GGLPolyRaster::SortEdges()
+{
+    const auto nRows = static_cast<std::uint64_t>(std::int64_t{mnLastRow} - mnFirstRow + 1);
+    if (nRows / 8 > moEdges.size() + 128)
+    {
+        std::sort(moEdges.begin(), moEdges.end(), [](const Edge& a, const Edge& b) { return a.firstRow < b.firstRow; });
+        return;
+    }
+    const auto RowOf = [this](const Edge& oEdge)
+    {
+        return static_cast<std::size_t>(std::int64_t{oEdge.firstRow} - mnFirstRow);
+    };
+    std::vector<std::size_t> oPlaces(static_cast<std::size_t>(nRows) + 1, 0);
+    for (const Edge& oEdge : moEdges)
+        ++oPlaces[RowOf(oEdge) + 1];
+    for (std::size_t i = 1; i < oPlaces.size(); ++i)
+        oPlaces[i] += oPlaces[i - 1];
+    std::vector<Edge> oSorted(moEdges.size());
+    for (const Edge& oEdge : moEdges)
+        oSorted[oPlaces[RowOf(oEdge)]++] = oEdge;
+    moEdges.swap(oSorted);
+}
+
+void GGLPolyRaster::FindEdges(int nFirstRow, int nLastRow, std::vector<Edge>& oEdges) const
+{
+    oEdges.clear();
+    if (moEdges.empty())
+        return;
+    const auto oEnd = std::upper_bound(moEdges.begin(), moEdges.end(), nLastRow,
+                                       [](int nRow, const Edge& oEdge) { return nRow < oEdge.firstRow; });
+    const auto nEdges = static_cast<std::size_t>(oEnd - moEdges.begin());
+    // Depth first over the bundles that reach down to the first row; the number of a bundle's first member is its own
+    // times the size of a bundle.
+    const auto Visit = [&](const auto& oSelf, std::size_t nLevel, std::size_t nBundle) -> void
+    {
+        if (moLastRows[nLevel][nBundle] < nFirstRow)
+            return;
+        const std::size_t nFirst = nBundle * BUNDLE;
+        if (nLevel == 0)
+        {
+            for (std::size_t i = nFirst; i < std::min(nFirst + BUNDLE, nEdges); ++i)
+            {
+                if (moEdges[i].lastRow >= nFirstRow)
+                    oEdges.push_back(moEdges[i]);
+            }
+            return;
+        }
+        std::size_t nMembers = nEdges;
+        for (std::size_t i = 0; i < nLevel; ++i)
+            nMembers = BundleCount(nMembers);
+        for (std::size_t i = nFirst; i < std::min(nFirst + BUNDLE, nMembers); ++i)
+            oSelf(oSelf, nLevel - 1, i);
+    };
+    if (nEdges > 0)
+        Visit(Visit, moLastRows.size() - 1, 0);
+}
+
+std::vector<double> GGLPolyRaster::GetScanline(int nRow) const
+{
+    std::vector<double> oCrossings;
+    GetScanline(nRow, oCrossings);
+    return oCrossings;
+}
+
+void GGLPolyRaster::GetScanline(int nRow, std::vector<double>& oCrossings) const
+{
+    std::vector<Edge> oEdges;
+    FindEdges(nRow, nRow, oEdges);
+    oCrossings.clear();
+    for (const Edge& oEdge : oEdges)
+        oCrossings.push_back(oEdge.At(nRow));
+    std::sort(oCrossings.begin(), oCrossings.end());
+}

@@ -1,0 +1,90 @@
+#pragma once
+
+#include "toolkit/api.h"
+#include "toolkit/core/gdbvertex.h"
+#include "toolkit/exceptions/place.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <limits>
+#include <vector>
+
+class GGLShape;
+
+// A polygon ready for scan conversion: filled even-odd, row by row. Row r is the line y = r + 0.5 through the centres
+// of the row's pixels; an edge belongs to the rows whose centres are at or below its upper end and above its lower one,
+// so every row has an even number of crossings. Rows are signed 32-bit numbers; what lies beyond them, and on the
+// largest of them, is left out. Vertices with a coordinate that is not a finite number are left out as if they had not
+// been given. Memory is that of the edges, however many rows they cross. A plain value.
+class KRV_TOOLKIT_API GGLPolyRaster
+{
+public:
+    // An edge with the rows whose centres it crosses.
+    struct Edge
+    {
+        Edge() {} // not cleared: there are many
+        Edge(int nFirstRow, int nLastRow, double nX, double nSlope)
+            : firstRow(nFirstRow), lastRow(nLastRow), x(nX), slope(nSlope)
+        {
+        }
+
+        int firstRow;
+        int lastRow;
+        double x;     // on firstRow
+        double slope; // x per row
+
+        // The crossing of one of these rows. An edge of enormous extent may give an infinity, never NaN.
+        double At(int nRow) const { return x + static_cast<double>(std::int64_t{nRow} - firstRow) * slope; }
+    };
+
+    // Only rows from nFirstRow to nFirstRow + nRows - 1 are kept; all of them when nRows is below 1.
+    GGLPolyRaster(const GGLShape& oShape, int nFirstRow, int nRows);
+    // pnRingStarts: the index of the first vertex of each ring, ascending; a ring ends where the next begins. Only rows
+    // from 0 to nRows - 1 are kept; all of them when nRows is below 1. Throws krv::DataException for a negative count,
+    // a missing array and starts that are out of order or outside the vertices.
+    GGLPolyRaster(const GDBVertex* poVertices, int nVertices, const int* pnRingStarts, int nRings, int nRows);
+    GGLPolyRaster(const GGLPolyRaster&);
+    GGLPolyRaster(GGLPolyRaster&&) noexcept;
+    GGLPolyRaster& operator=(const GGLPolyRaster&);
+    GGLPolyRaster& operator=(GGLPolyRaster&&) noexcept;
+    ~GGLPolyRaster();
+
+    // Whether any row has a crossing.
+    bool IsNonEmpty() const { return !moEdges.empty(); }
+    // The first and last row with crossings; 0 and -1 without any.
+    int GetFirstRow() const { return mnFirstRow; }
+    int GetLastRow() const { return mnLastRow; }
+    // All crossings lie between these, rounding aside.
+    double GetLeft() const { return mnLeft; }
+    double GetRight() const { return mnRight; }
+
+    // The crossings of a row, ascending, in pairs that enclose what is inside; empty for a row without any. Takes time
+    // in proportion to their number, but for the logarithms of search and sort.
+    std::vector<double> GetScanline(int nRow) const;
+    // The same into a vector that is used again.
+    void GetScanline(int nRow, std::vector<double>& oCrossings) const;
+
+    // Replaces the list by the edges that cross a row from nFirstRow to nLastRow, by their first row.
+    void FindEdges(int nFirstRow, int nLastRow, std::vector<Edge>& oEdges) const;
+
+private:
+    struct RowLimits
+    {
+        std::int64_t first = std::numeric_limits<int>::min();
+        std::int64_t last = std::numeric_limits<int>::max() - 1; // so that a loop over rows can end
+    };
+
+    void AddRing(const GDBVertex* poFirst, const GDBVertex* poEnd, const RowLimits& oLimits);
+    void AddUsable(const GDBVertex* poFirst, const GDBVertex* poEnd, const RowLimits& oLimits);
+    void AddEdge(const GDBVertex& oUpper, const GDBVertex& oLower, const RowLimits& oRows);
+    void Finish();
+    void SortEdges();
+
+    std::vector<Edge> moEdges;
+    // For every bundle of edges the last row of them all; then for every bundle of these, and so on.
+    std::vector<std::vector<int>> moLastRows;
+    int mnFirstRow = 0;
+    int mnLastRow = -1;
+    double mnLeft = 0;
+    double mnRight = 0;
+};
