@@ -83,9 +83,9 @@ constexpr std::array<std::array<std::uint64_t, 2>, 64> MakeBitMasks()
 // A pair of planes with one bit of the first set, for each of its 64.
 alignas(16) constexpr std::array<std::array<std::uint64_t, 2>, 64> BIT_MASKS = MakeBitMasks();
 
-// Flips the bits of edges in the planes of a dense block: column c of the area has the bit c + 64, all that lies left
-// of the area is bit 63, and all that lies right of it the one behind its last. The crossings are those of Edge::At;
-// where they are below 0 the bits are some of these all the same.
+// Flips the bits of edges in the planes of a dense block: column c of the area has the bit c + 64, and all that lies
+// right of it the one behind its last. What lies left of the area is bit 63 where it rounds to the first column and
+// else bit 62. The crossings are those of Edge::At; where they are below 0 the bits are some of these all the same.
 class BitFlipper
 {
 public:
@@ -126,19 +126,22 @@ private:
     // By fours of rows; those beyond the edge are not looked at.
     void FindBits(const GGLPolyRaster::Edge& oEdge, int nBlockRow, int nFirst, int nLast, Bits& oBits) const
     {
-        const __m128d oX = _mm_set1_pd(oEdge.x), oSlope = _mm_set1_pd(oEdge.slope);
+        const __m128d oX = _mm_set1_pd(oEdge.x), oSlope = _mm_set1_pd(oEdge.slope), oArea = _mm_set1_pd(mnFirst);
         const __m128d oFrom = _mm_set1_pd(static_cast<double>(std::int64_t{nBlockRow} + nFirst - oEdge.firstRow));
         __m128d oRows = _mm_add_pd(oFrom, _mm_set_pd(1, 0)), oNextRows = _mm_add_pd(oFrom, _mm_set_pd(3, 2));
-        const auto Columns = [&](__m128d oTwo)
+        const auto Columns = [this](__m128d oCrossings)
         {
-            const __m128d oCrossings = _mm_add_pd(oX, _mm_mul_pd(oTwo, oSlope));
             const __m128d oHigh = _mm_max_pd(_mm_add_pd(oCrossings, _mm_set1_pd(0.5)), _mm_set1_pd(mnLowest));
             return _mm_cvttpd_epi32(_mm_min_pd(oHigh, _mm_set1_pd(mnHighest)));
         };
         for (auto nRow = static_cast<std::size_t>(nFirst); nRow <= static_cast<std::size_t>(nLast); nRow += 4)
         {
-            const __m128i oFour = _mm_unpacklo_epi64(Columns(oRows), Columns(oNextRows));
-            const __m128i oBit = _mm_sub_epi32(oFour, _mm_set1_epi32(mnFirst));
+            const __m128d oCrossings = _mm_add_pd(oX, _mm_mul_pd(oRows, oSlope));
+            const __m128d oNextCrossings = _mm_add_pd(oX, _mm_mul_pd(oNextRows, oSlope));
+            const __m128 oLeft = _mm_shuffle_ps(_mm_castpd_ps(_mm_cmplt_pd(oCrossings, oArea)),
+                                                _mm_castpd_ps(_mm_cmplt_pd(oNextCrossings, oArea)), 0x88);
+            const __m128i oFour = _mm_unpacklo_epi64(Columns(oCrossings), Columns(oNextCrossings));
+            const __m128i oBit = _mm_add_epi32(_mm_sub_epi32(oFour, _mm_set1_epi32(mnFirst)), _mm_castps_si128(oLeft));
             const __m128i oPlace = _mm_slli_epi32(_mm_srai_epi32(oBit, 6), 4);
             const __m128i oMask = _mm_slli_epi32(_mm_and_si128(oBit, _mm_set1_epi32(63)), 4);
             _mm_store_si128(reinterpret_cast<__m128i*>(&oBits.places[nRow]), oPlace);
@@ -162,8 +165,9 @@ private:
         const auto nFrom = static_cast<double>(std::int64_t{nBlockRow} - oEdge.firstRow);
         for (int nRow = nFirst; nRow <= nLast; ++nRow)
         {
-            const double nColumn = oEdge.x + (nFrom + nRow) * oEdge.slope + 0.5;
-            const auto nBit = static_cast<std::int32_t>(std::min(std::max(nColumn, mnLowest), mnHighest)) - mnFirst;
+            const double nCrossing = oEdge.x + (nFrom + nRow) * oEdge.slope;
+            const auto nColumn = static_cast<std::int32_t>(std::min(std::max(nCrossing + 0.5, mnLowest), mnHighest));
+            const std::int32_t nBit = nColumn - mnFirst - (nCrossing < mnFirst ? 1 : 0);
             oBits.places[static_cast<std::size_t>(nRow)] = (nBit >> 6) * 16;
             oBits.masks[static_cast<std::size_t>(nRow)] = (nBit & 63) * 16;
         }
@@ -340,7 +344,9 @@ void PolygonFill::TakeRow(int nRow, Planes* pRow)
     const std::int64_t nFirstColumn = std::max<std::int64_t>(moArea.firstColumn, 0);
     const auto nBits = static_cast<std::uint64_t>(moArea.lastColumn - nFirstColumn + 1);
     const auto nWords = static_cast<std::size_t>((nBits + 63) / 64);
-    std::uint64_t nInside = 0 - (pRow[0].odd & 1);
+    std::uint64_t nInside = 0 - ((pRow[0].odd ^ pRow[0].odd >> 1) & 1);
+    // A span that begins left of the area and rounds to its first column has at least this one.
+    pRow[1].again |= nInside << 63 & (pRow[0].odd | pRow[0].again) << 63;
     pRow[0] = {};
     for (std::size_t i = 0; i < nWords; ++i)
     {

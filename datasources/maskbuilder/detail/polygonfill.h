@@ -12,10 +12,10 @@ namespace krv::datasources::detail
 // Sets the bits of polygons in an area of a mask by the rule for spans: the crossings (s, e) of a pair set the columns
 // from trunc(s + 0.5) to trunc(e - 0.5), at least the first of them.
 //
-// Rows with few crossings are filled span by span. For rows with many the crossings are not even sorted. Left of no
-// column is anything special from 0 on, where truncation is floor: then a pair fills from the bit floor(s + 0.5) to the
-// one before floor(e + 0.5), which is the running exclusive-or of a plane in which every crossing flips that bit; and
-// where both are one bit the span is that bit alone, which is a second plane of the bits hit more than once. Rows with
+// Rows with few crossings are filled span by span. For rows with many the crossings are not even sorted. From column 0
+// on truncation is floor: a pair fills from the bit floor(s + 0.5) to the one before floor(e + 0.5), which is the
+// running exclusive-or of a plane in which every crossing flips that bit; where both are one bit the span is that bit
+// alone, which is a second plane of the bits hit more than once. Pairs left of the area set nothing. Rows with
 // crossings below 0 that reach the area are always filled span by span.
 class PolygonFill
 {
@@ -44,7 +44,7 @@ private:
     PixelArea moArea;                         // narrowed to the polygon while one is filled
     std::vector<GGLPolyRaster::Edge> moEdges; // of the block
     std::vector<double> moCrossings;
-    std::vector<Planes> moPlanes; // rows of mnRowWords; the last bit of the first word is what lies left of the area
+    std::vector<Planes> moPlanes; // rows of mnRowWords, the first word for what lies left of the area
     std::size_t mnRowWords = 0;
     std::vector<std::uint64_t> moWords;
     std::vector<bool> moSpanRows;

@@ -1,0 +1,254 @@
+#include "datasources/maskbuilder/polygonmaskbuilder.h"
+
+#include "gobs/mask/mask.h"
+#include "gobs/raster/raster.h"
+#include "toolkit/core/gglshape.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <limits>
+#include <memory>
+#include <random>
+#include <set>
+#include <string>
+#include <vector>
+
+namespace krv::datasources
+{
+
+namespace
+{
+
+using krv::gobs::Mask;
+using krv::gobs::Raster;
+using Ring = std::vector<GDBVertex>;
+
+GGLShape ShapeOf(const std::vector<Ring>& oRings)
+{
+    GGLShape oShape;
+    for (const Ring& oRing : oRings)
+        oShape.AddRing(oRing);
+    return oShape;
+}
+
+std::unique_ptr<Mask> Build(const PolygonMaskBuilder& oBuilder, unsigned int nWidth, unsigned int nHeight,
+                            const krv::gobs::RasterContext& oContext = {})
+{
+    const Raster oRaster({nWidth, nHeight, 1, krv::gobs::eDT_BIT}, oContext);
+    return std::unique_ptr<Mask>(oBuilder.BuildMask(oRaster));
+}
+
+// The set columns of a row as text: file columns.
+std::string ColumnsOf(const Mask& oMask, int nRow)
+{
+    std::string text;
+    const int nFirst = oMask.GetX() - static_cast<int>(oMask.GetXMargin());
+    const int nFirstRow = oMask.GetY() - static_cast<int>(oMask.GetYMargin());
+    for (std::uint64_t c = 0; c < oMask.GetFullWidth(); ++c)
+        text += oMask.GetBit(c, static_cast<std::uint64_t>(nRow - nFirstRow))
+                    ? std::to_string(nFirst + static_cast<int>(c)) + " "
+                    : "";
+    return text;
+}
+
+Ring Box(double nLeft, double nRight, double nTop = 0, double nBottom = 1)
+{
+    return {{nLeft, nTop}, {nRight, nTop}, {nRight, nBottom}, {nLeft, nBottom}};
+}
+
+TEST(PolygonMaskBuilder, SpansFollowTheRule)
+{
+    struct Case
+    {
+        double left;
+        double right;
+        const char* columns;
+    };
+    for (const Case& oCase : {Case{2.4, 5.6, "2 3 4 5 "}, Case{2.6, 2.9, "3 "}, Case{-3, 0.3, "-2 -1 0 "},
+                              Case{-2.6, -1.6, "-2 "}, Case{2, 2, "2 "}, Case{6.5, 1e300, "7 8 9 "}, Case{-9, -5, ""},
+                              Case{-1e300, 1e300, "-4 -3 -2 -1 0 1 2 3 4 5 6 7 8 9 "}, Case{12, 14, ""}})
+    {
+        const auto poMask =
+            Build(PolygonMaskBuilder(ShapeOf({Box(oCase.left, oCase.right)}), 0, 0), 6, 1, {0, 0, 4, 0});
+        EXPECT_EQ(ColumnsOf(*poMask, 0), oCase.columns) << oCase.left << " to " << oCase.right;
+    }
+}
+
+TEST(PolygonMaskBuilder, ClipsAndAddsUp)
+{
+    PolygonMaskBuilder oBuilder(ShapeOf({Box(0, 100, 0, 100)}), 0, 0);
+    oBuilder.SetClipRect({0, 0, 0, 0});
+    EXPECT_EQ(Build(oBuilder, 30, 20)->CountSet(), 600u);
+    oBuilder.SetClipRect({10, 10, 5, 5});
+    const auto poMask = Build(oBuilder, 30, 20);
+    EXPECT_EQ(poMask->CountSet(), 25u);
+    EXPECT_TRUE(poMask->GetBit(10, 10) && poMask->GetBit(14, 14));
+    oBuilder.SetClipRect({2147483000, 2147483000, 2147483647, 2147483647});
+    EXPECT_EQ(Build(oBuilder, 30, 20)->CountSet(), 0u);
+    oBuilder.SetClipRect({5, 5, 0, 0});
+    EXPECT_EQ(Build(oBuilder, 30, 20)->CountSet(), 0u);
+
+    // Even-odd within a polygon, union of polygons; the row limits of the arguments.
+    PolygonMaskBuilder oHole(ShapeOf({Box(0, 10, 0, 10), Box(2, 8, 2, 8)}), 0, 0);
+    EXPECT_EQ(Build(oHole, 10, 10)->CountSet(), 64u);
+    const PolygonMaskBuilder oCopy(oHole);
+    const Ring oInner = Box(2, 8, 2, 8);
+    const int nStart = 0;
+    oHole.AddPolygon(oInner.data(), 4, &nStart, 1, 5);
+    EXPECT_EQ(Build(oHole, 10, 10)->CountSet(), 64u + 18);
+    EXPECT_EQ(Build(oCopy, 10, 10)->CountSet(), 64u);
+    EXPECT_EQ(Build(PolygonMaskBuilder(ShapeOf({Box(0, 10, 0, 10)}), 3, 2), 10, 10)->CountSet(), 20u);
+    EXPECT_EQ(Build(oCopy, 10, 10, {500, -300, 2, 2})->CountSet(), 0u);
+}
+
+// Every pixel by itself, straight from the rule, in extended precision. Columns where rounding decides are noted.
+struct BruteRow
+{
+    std::set<long long> set;
+    std::set<long long> uncertain;
+};
+
+BruteRow BruteForce(const std::vector<Ring>& oRings, long long nRow, long long nFirst, long long nLast)
+{
+    const long double nCentre = static_cast<long double>(nRow) + 0.5L;
+    std::vector<long double> oCrossings;
+    for (const Ring& oRing : oRings)
+        for (std::size_t i = 0; i < oRing.size(); ++i)
+        {
+            const GDBVertex& a = oRing[i];
+            const GDBVertex& b = oRing[(i + 1) % oRing.size()];
+            if ((a.y <= nCentre) != (b.y <= nCentre))
+                oCrossings.push_back(a.x + (nCentre - a.y) * (static_cast<long double>(b.x) - a.x) /
+                                               (static_cast<long double>(b.y) - a.y));
+        }
+    std::sort(oCrossings.begin(), oCrossings.end());
+    BruteRow oRow;
+    for (const long double nCrossing : oCrossings)
+    {
+        const long double nEdge = std::round(nCrossing + 0.5L);
+        if (std::fabs(nCrossing + 0.5L - nEdge) < 1e-7L || std::fabs(nCrossing) < 1e-7L)
+            for (long long k = -2; k <= 2; ++k)
+                oRow.uncertain.insert(static_cast<long long>(nEdge) + k);
+    }
+    for (std::size_t i = 0; i < oCrossings.size(); i += 2)
+    {
+        if (oCrossings[i + 1] < static_cast<long double>(nFirst))
+            continue;
+        const auto nStart = static_cast<long long>(oCrossings[i] + 0.5L);
+        const auto nEnd = std::max(nStart, static_cast<long long>(oCrossings[i + 1] - 0.5L));
+        for (long long c = std::max(nStart, nFirst); c <= std::min(nEnd, nLast); ++c)
+            oRow.set.insert(c);
+    }
+    return oRow;
+}
+
+TEST(PolygonMaskBuilder, EqualsEveryPixelByItself)
+{
+    std::mt19937 oRandom(11);
+    const auto Number = [&](int nFrom, int nTo)
+    {
+        return std::uniform_int_distribution<int>(nFrom, nTo)(oRandom);
+    };
+    std::uint64_t nSet = 0, nUncertain = 0, nPixels = 0;
+    for (int nCase = 0; nCase < 1000; ++nCase)
+    {
+        // Every tenth has so many crossings that they are not sorted; every third lies on quarters of pixels.
+        const bool bDense = nCase % 10 == 0, bQuarters = nCase % 3 == 0;
+        std::uniform_real_distribution<double> oX(nCase % 2 == 0 ? -80 : 3, nCase % 5 == 0 ? 900 : 150), oY(-60, 120);
+        std::vector<Ring> oRings(static_cast<std::size_t>(Number(1, 3)));
+        for (Ring& oRing : oRings)
+            for (int n = bDense ? Number(150, 500) : Number(0, 12); n > 0; --n)
+                oRing.push_back(bQuarters ? GDBVertex{std::round(oX(oRandom) * 4) / 4, std::round(oY(oRandom) * 4) / 4}
+                                          : GDBVertex{oX(oRandom), oY(oRandom)});
+        PolygonMaskBuilder oBuilder(ShapeOf(oRings), 0, 0);
+        const krv::gobs::RasterContext oContext(Number(-60, 60), Number(-40, 40),
+                                                static_cast<unsigned int>(Number(0, 9)),
+                                                static_cast<unsigned int>(Number(0, 5)));
+        const auto poMask = Build(oBuilder, static_cast<unsigned int>(Number(1, 200)),
+                                  static_cast<unsigned int>(Number(1, 40)), oContext);
+        const long long nFirst = poMask->GetX() - static_cast<long long>(poMask->GetXMargin());
+        const long long nLast = nFirst + static_cast<long long>(poMask->GetFullWidth()) - 1;
+        for (std::uint64_t r = 0; r < poMask->GetFullHeight(); ++r)
+        {
+            const long long nRow =
+                poMask->GetY() - static_cast<long long>(poMask->GetYMargin()) + static_cast<long long>(r);
+            const BruteRow oRow = BruteForce(oRings, nRow, nFirst, nLast);
+            for (long long c = nFirst; c <= nLast; ++c)
+            {
+                ++nPixels;
+                nSet += oRow.set.count(c);
+                const bool bBit = poMask->GetBit(static_cast<std::uint64_t>(c - nFirst), r);
+                if (bBit == (oRow.set.count(c) != 0))
+                    continue;
+                ++nUncertain;
+                ASSERT_TRUE(oRow.uncertain.count(c)) << "case " << nCase << ", column " << c << ", row " << nRow;
+            }
+        }
+    }
+    EXPECT_GT(nSet, nPixels / 10);
+    EXPECT_LT(nUncertain, nPixels / 100000);
+}
+
+TEST(PolygonMaskBuilder, HostileOutlinesDoNoHarm)
+{
+    const double nNan = std::numeric_limits<double>::quiet_NaN(), nInf = std::numeric_limits<double>::infinity();
+    const double nMost = std::numeric_limits<double>::max();
+    const auto Count = [](const std::vector<Ring>& oRings)
+    {
+        return Build(PolygonMaskBuilder(ShapeOf(oRings), 0, 0), 20, 10, {0, 0, 3, 3})->CountSet();
+    };
+    EXPECT_EQ(Count({}), 0u);
+    EXPECT_EQ(Count({{}, {{1, 1}}, {{nNan, 2}, {3, nInf}, {5, 5}}}), 0u);
+    // Left out, the rest is the square without them.
+    EXPECT_EQ(Count({{{nNan, 0}, {0, 0}, {10, 0}, {nInf, 4}, {10, 10}, {3, -nInf}, {0, 10}, {nNan, nNan}}}), 100u);
+    EXPECT_EQ(Count({{{0, 0}, {10, 0}, {10, 10}, {0, 10}, {0, 0}}}), 100u);
+    EXPECT_EQ(Count({{{-nMost, -nMost}, {nMost, -nMost}, {nMost, nMost}, {-nMost, nMost}}}), 26u * 16);
+    EXPECT_EQ(Count({{{-1e9, -1e9}, {1e9, -1e9}, {1e9, 1e9}, {-1e9, 1e9}},
+                     {{5, -nMost}, {9, -nMost}, {9, nMost}, {5, nMost}}}),
+              22u * 16);
+    Count({{{-nMost, -1}, {nMost, nMost}, {nMost, -nMost}, {-1, nMost}, {1e-300, -1e-300}, {nMost, 0.75}}});
+
+    // A million edges, all of them in every row: the mask is that of the sorted crossings.
+    Ring oZigzag;
+    std::mt19937 oRandom(3);
+    std::uniform_real_distribution<double> oX(-5, 400);
+    for (int i = 0; i < 1000000; ++i)
+        oZigzag.push_back({oX(oRandom), i % 2 == 0 ? -2e9 : 2e9});
+    const GGLPolyRaster oPolygon(ShapeOf({oZigzag}), 0, 0);
+    EXPECT_EQ(oPolygon.GetScanline(7).size(), 1000000u);
+    EXPECT_EQ(Build(PolygonMaskBuilder(ShapeOf({oZigzag}), 0, 0), 300, 5, {2147483000, 100, 0, 0})->CountSet(), 0u);
+    EXPECT_GT(Build(PolygonMaskBuilder(ShapeOf({oZigzag}), 0, 0), 300, 5, {20, 5, 0, 0})->CountSet(), 1400u);
+}
+
+TEST(GGLPolyRaster, TellsItsRowsAndRefusesBadArguments)
+{
+    const GGLPolyRaster oPolygon(ShapeOf({{{4, 2.5}, {8, 6}, {4, 6}}, Box(20, 21, -4, -3)}), 0, 0);
+    EXPECT_TRUE(oPolygon.IsNonEmpty());
+    EXPECT_EQ(oPolygon.GetFirstRow(), -4);
+    EXPECT_EQ(oPolygon.GetLastRow(), 5);
+    EXPECT_EQ(oPolygon.GetScanline(-4), (std::vector<double>{20, 21}));
+    EXPECT_TRUE(oPolygon.GetScanline(0).empty());
+    EXPECT_EQ(oPolygon.GetScanline(2), (std::vector<double>{4, 4})); // a centre on a vertex counts once
+    EXPECT_TRUE(oPolygon.GetScanline(std::numeric_limits<int>::max()).empty());
+    const GGLPolyRaster oFlat(ShapeOf({{{0, 1.2}, {9, 1.2}, {4, 1.3}}}), 0, 0);
+    EXPECT_FALSE(oFlat.IsNonEmpty());
+    EXPECT_EQ(oFlat.GetLastRow(), -1);
+
+    const Ring oBox = Box(0, 4);
+    const std::vector<int> oStarts{0, 2}, oBackwards{2, 0}, oBeyond{0, 5}, oNegative{-1, 2};
+    EXPECT_NO_THROW(GGLPolyRaster(oBox.data(), 4, oStarts.data(), 2, 0));
+    EXPECT_NO_THROW(GGLPolyRaster(nullptr, 0, nullptr, 0, 0));
+    EXPECT_THROW(GGLPolyRaster(nullptr, 4, oStarts.data(), 2, 0), krv::DataException);
+    EXPECT_THROW(GGLPolyRaster(oBox.data(), 4, nullptr, 2, 0), krv::DataException);
+    EXPECT_THROW(GGLPolyRaster(oBox.data(), -4, oStarts.data(), 2, 0), krv::DataException);
+    EXPECT_THROW(GGLPolyRaster(oBox.data(), 4, oStarts.data(), -2, 0), krv::DataException);
+    for (const auto& oBad : {oBackwards, oBeyond, oNegative})
+        EXPECT_THROW(GGLPolyRaster(oBox.data(), 4, oBad.data(), 2, 0), krv::DataException);
+}
+
+} // namespace
+
+} // namespace krv::datasources
