@@ -75,6 +75,15 @@ ChannelSelection::ChannelSelection(const ImageLayout& oLayout, const std::vector
         mbWholePlane = moPositions[nAt] == nAt;
 }
 
+bool ChannelSelection::CoversPlane(unsigned int nPlane, unsigned int nPlaneChannels) const
+{
+    std::vector<bool> oCovered(nPlaneChannels, false);
+    for (const ChannelPlace& oPlace : moPlaces)
+        if (oPlace.mnPlane == nPlane)
+            oCovered[oPlace.mnPosition] = true;
+    return std::find(oCovered.begin(), oCovered.end(), false) == oCovered.end();
+}
+
 // The blocks that a rectangle touches.
 struct BlockImage::Range
 {
@@ -424,7 +433,7 @@ void BlockImage::WritePart(const ChannelSelection& oChannels, const PixelRect& o
     const unsigned int nPlaneChannels = moLayout.GetPlane(oBlock.mnPlane).mnChannels;
     const std::size_t nPlanePitch = oPart.mnWidth * moLayout.GetPixelBytes(oBlock.mnPlane);
     unsigned char* pPlane = moScratch.Get(nPlanePitch * oPart.mnHeight);
-    if (nPlaneChannels > 1)
+    if (!oChannels.CoversPlane(oBlock.mnPlane, nPlaneChannels))
     {
         const Pixels oOld = mbParts ? ObtainPart(oBlock, oPart, Keep::eNothing, moScratch) : LoadBlock(oBlock, oPart);
         if (oOld.mpFirst != pPlane)
@@ -433,9 +442,16 @@ void BlockImage::WritePart(const ChannelSelection& oChannels, const PixelRect& o
     }
     const codec::PixelArea oArea{oPart.mnWidth, oPart.mnHeight, oChannels.GetValueBytes()};
     for (std::size_t nAt = 0; nAt < oChannels.GetCount(); ++nAt)
-        if (oChannels.GetPlaces()[nAt].mnPlane == oBlock.mnPlane)
-            CopyChannel(pSource, nPitch, nAt, oChannels.GetCount(), pPlane, nPlanePitch,
-                        oChannels.GetPlaces()[nAt].mnPosition, nPlaneChannels, oArea);
+    {
+        const ChannelPlace& oPlace = oChannels.GetPlaces()[nAt];
+        if (oPlace.mnPlane != oBlock.mnPlane)
+            continue;
+        if (nPlaneChannels == 1)
+            codec::ExtractChannel(pSource, nPitch, nAt, oChannels.GetCount(), pPlane, nPlanePitch, oArea);
+        else
+            CopyChannel(pSource, nPitch, nAt, oChannels.GetCount(), pPlane, nPlanePitch, oPlace.mnPosition,
+                        nPlaneChannels, oArea);
+    }
     mpoSource->WriteBlock(oBlock, oPart, pPlane, nPlanePitch);
 }
 

@@ -30,6 +30,8 @@ public:
     // Whether all come from one plane; whether they are just that plane's pixels.
     bool IsOnePlane() const { return mbOnePlane; }
     bool IsWholePlane() const { return mbWholePlane; }
+    // Whether no channel of a plane is missing.
+    bool CoversPlane(unsigned int nPlane, unsigned int nPlaneChannels) const;
     // Whether every plane that takes part has one channel.
     bool IsSinglePlanes() const { return mbSinglePlanes; }
     // The positions within the plane, for a selection of one plane.
