@@ -192,8 +192,9 @@ Times WriteByLibtiff(Pixels& oPixels, const std::string& codecName, const std::s
     {
         TIFFSetField(poTiff, TIFFTAG_COMPRESSION, codecName == "zstd" ? COMPRESSION_ZSTD : COMPRESSION_ADOBE_DEFLATE);
         TIFFSetField(poTiff, TIFFTAG_PREDICTOR, PREDICTOR_HORIZONTAL);
-        TIFFSetField(poTiff, codecName == "zstd" ? TIFFTAG_ZSTD_LEVEL : TIFFTAG_ZIPQUALITY,
-                     codecName == "zstd" ? ZSTD_LEVEL : DEFLATE_LEVEL);
+        // Its deflate level is 6 by itself.
+        if (codecName == "zstd")
+            TIFFSetField(poTiff, TIFFTAG_ZSTD_LEVEL, ZSTD_LEVEL);
     }
     for (unsigned int nTile = 0; nTile < oPixels.CountTiles(); ++nTile)
         if (TIFFWriteEncodedTile(poTiff, nTile, oPixels.GetTile(nTile), TILE_BYTES) < 0)
