@@ -113,4 +113,14 @@ const krv::gobs::DataType& RasterAccess::GetDataType() const
     return mpoChannels->moOpened.moType;
 }
 
+IDataset* RasterAccess::GetDataset() const
+{
+    return mpoChannels->mpoDataset;
+}
+
+const std::vector<unsigned int>& RasterAccess::GetChannels() const
+{
+    return mpoChannels->moChannels;
+}
+
 } // namespace krv::datasources

@@ -7,6 +7,8 @@
 namespace krv::datasources
 {
 
+class IDataset;
+
 namespace detail
 {
 class RasterChannels;
@@ -42,6 +44,11 @@ public:
     unsigned int GetHeight() const override;
     unsigned int GetChansCount() const override;
     const krv::gobs::DataType& GetDataType() const override;
+
+    // What is read or written: the dataset, null before there is one, which stays where it is, and the numbers of its
+    // channels, or of its bitmaps.
+    IDataset* GetDataset() const;
+    const std::vector<unsigned int>& GetChannels() const;
 
 protected:
     // No dataset, no channels, no margins, eMirror.

@@ -175,6 +175,16 @@ void File::Flush(const Place& oPlace)
         throw IOException(moName, moName + ": writing failed: " + SystemErrorText(errno), oPlace);
 }
 
+void File::CutBack(std::uint64_t nBytes) noexcept
+{
+    struct stat oStatus = {};
+    if (nBytes >= mnSize || ::fstat(mnDescriptor, &oStatus) != 0 ||
+        static_cast<std::uint64_t>(oStatus.st_size) != mnSize)
+        return;
+    if (::ftruncate(mnDescriptor, static_cast<off_t>(nBytes)) == 0)
+        mnSize = nBytes;
+}
+
 // The folder is flushed as well as the system lets it: not every file system has that.
 void File::Rename(const std::string& fileName, const Place& oPlace)
 {

@@ -59,6 +59,10 @@ public:
     // Makes sure that what was written reaches the disk.
     void Flush(const Place& oPlace = Place::Current());
 
+    // Cuts off what this object wrote behind nBytes, unless somebody else wrote there too. Failures leave the file as
+    // it is.
+    void CutBack(std::uint64_t nBytes) noexcept;
+
     // From now on messages, and GetName, name the file otherwise.
     void ShowAs(const std::string& fileName) { moName = fileName; }
 

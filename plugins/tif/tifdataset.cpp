@@ -230,6 +230,11 @@ const std::vector<PageLevel>& TifDataset::GetLevels(PixelUse eUse) const
     return eUse == PixelUse::eImage ? GetPages().moLevels : GetPages().moMaskLevels;
 }
 
+unsigned int TifDataset::GetLevelBitmap() const
+{
+    return GetPages().moMasks.empty() ? 0 : GetPages().moMasks.front().mnNumber;
+}
+
 std::shared_ptr<support::BlockImage> TifDataset::OpenPage(std::uint64_t nDirectory, PixelUse eUse)
 {
     CheckOpen();

@@ -84,6 +84,8 @@ public:
 
     // For the overview managers: the levels of the image or of the first bitmap, and the pixels of a page.
     const std::vector<PageLevel>& GetLevels(PixelUse eUse) const;
+    // The number of the bitmap that the mask levels belong to: the first one in the file.
+    unsigned int GetLevelBitmap() const;
     std::shared_ptr<support::BlockImage> OpenPage(std::uint64_t nDirectory, PixelUse eUse);
     krv::datasources::AuxiliaryData ReadPageMetadata(std::uint64_t nDirectory) const;
 

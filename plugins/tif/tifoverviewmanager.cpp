@@ -30,9 +30,20 @@ const PageLevel& TifOverviewManager::Get(unsigned int nLevel, const Place& oPlac
     return *pLevel;
 }
 
-unsigned int TifOverviewManager::GetChannels() const
+// The channel of the pages: those of a bitmap have one, whatever its number.
+unsigned int TifOverviewManager::FindChannel(unsigned int nChannel) const
 {
-    return meUse == PixelUse::eImage ? moDataset.GetChanCount() : 1;
+    if (meUse == PixelUse::eBitmap)
+        return nChannel == moDataset.GetLevelBitmap() ? 1 : 0;
+    return nChannel <= moDataset.GetChanCount() ? nChannel : 0;
+}
+
+unsigned int TifOverviewManager::GetChannel(unsigned int nChannel, const Place& oPlace) const
+{
+    const unsigned int nFound = FindChannel(nChannel);
+    if (nFound == 0)
+        throw DataException(moDataset.GetName() + ": channel " + std::to_string(nChannel) + " does not exist", oPlace);
+    return nFound;
 }
 
 std::vector<unsigned int> TifOverviewManager::GetLevels() const
@@ -46,14 +57,18 @@ std::vector<unsigned int> TifOverviewManager::GetLevels() const
 krv::datasources::IRasterIO* TifOverviewManager::GetOverviewIO(unsigned int nLevel,
                                                                const std::vector<unsigned int>& oChannels)
 {
-    const PageLevel& oLevel = Get(nLevel, Place::Current());
-    return new support::OverviewIO(nLevel, moDataset.OpenPage(oLevel.moPage.mnOffset, meUse), oChannels);
+    const Place oPlace = Place::Current();
+    const PageLevel& oLevel = Get(nLevel, oPlace);
+    std::vector<unsigned int> oPageChannels;
+    for (const unsigned int nChannel : oChannels)
+        oPageChannels.push_back(GetChannel(nChannel, oPlace));
+    return new support::OverviewIO(nLevel, moDataset.OpenPage(oLevel.moPage.mnOffset, meUse), oPageChannels);
 }
 
 bool TifOverviewManager::IsValid(unsigned int nChannel, unsigned int nLevel) const
 {
-    return nChannel >= 1 && nChannel <= GetChannels() && Find(nLevel) != nullptr &&
-           moDataset.IsLevelValid(nChannel, nLevel, meUse);
+    const unsigned int nFound = FindChannel(nChannel);
+    return nFound != 0 && Find(nLevel) != nullptr && moDataset.IsLevelValid(nFound, nLevel, meUse);
 }
 
 unsigned int TifOverviewManager::GetLevelWidth(unsigned int nLevel) const
@@ -98,9 +113,7 @@ void TifOverviewManager::SetValid(unsigned int nChannel, unsigned int nLevel, bo
 {
     const Place oPlace = Place::Current();
     Get(nLevel, oPlace);
-    if (nChannel == 0 || nChannel > GetChannels())
-        throw DataException(moDataset.GetName() + ": channel " + std::to_string(nChannel) + " does not exist", oPlace);
-    moDataset.SetLevelValid(nChannel, nLevel, bValid, meUse, oPlace);
+    moDataset.SetLevelValid(GetChannel(nChannel, oPlace), nLevel, bValid, meUse, oPlace);
 }
 
 void TifOverviewManager::SetResamplingName(const std::string& oName)

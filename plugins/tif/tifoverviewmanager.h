@@ -32,7 +32,8 @@ public:
 private:
     const PageLevel* Find(unsigned int nLevel) const;
     const PageLevel& Get(unsigned int nLevel, const Place& oPlace) const;
-    unsigned int GetChannels() const;
+    unsigned int FindChannel(unsigned int nChannel) const; // 0 when there is none
+    unsigned int GetChannel(unsigned int nChannel, const Place& oPlace) const;
 
     TifDataset& moDataset;
     PixelUse meUse;

@@ -23,6 +23,7 @@ constexpr char FOOTER[] = "Examples:\n"
                           "  krv stats scene.tif --json             statistics per channel, for other programs\n"
                           "  krv view scene.tif look.png --size 800 a quick look\n"
                           "  krv convert scene.tif copy.tif --options COMPRESS=ZSTD\n"
+                          "  krv overviews scene.tif                overview levels, powers of two\n"
                           "  krv doctor scene.tif                   why a file does or does not open\n"
                           "`krv VERB --help` explains a verb. Exit code: 0 done, 1 failed, 2 wrong usage.\n"
                           "Formats are found below the folder that KRVHOME names, else beside the library.";
@@ -91,6 +92,7 @@ int RunApplication(int nArguments, char** pArguments)
     AddViewVerb(oApp, oSelection);
     AddWalkVerb(oApp, oSelection);
     AddConvertVerb(oApp, oSelection);
+    AddOverviewsVerb(oApp, oSelection);
     AddDoctorVerb(oApp, oSelection);
     oApp.footer(FOOTER); // after the verbs, which would take it over
     try

@@ -66,6 +66,7 @@ FileEditor::FileEditor(const std::string& fileName)
 {
     mpoSpace = std::make_unique<Space>(fileName, mpoFile->GetSize(), moHeader.mbBigTiff ? INT64_MAX : CLASSIC_LIMIT);
     mpoSpace->Age();
+    mnCommittedSize = mpoFile->GetSize();
     ReadPages();
 }
 
@@ -81,6 +82,8 @@ FileEditor::~FileEditor()
 
 void FileEditor::Discard() noexcept
 {
+    if (!mbEnded && moTemporary.empty() && mpoFile)
+        mpoFile->CutBack(mnCommittedSize);
     mbEnded = true;
     if (moTemporary.empty())
         return;
@@ -600,6 +603,7 @@ void FileEditor::Commit(const std::vector<Written>& oWritten)
         throw;
     }
     mpoSpace->Age();
+    mnCommittedSize = mpoFile->GetSize();
     moHeader.mnFirstDirectory = bFirst ? oFirst.moDirectory.mnOffset : moPages.front()->moDirectory.mnOffset;
     unsigned char aHeader[FileHeader::BYTES] = {};
     moHeader.Write(aHeader, moHeader.mnFirstDirectory);

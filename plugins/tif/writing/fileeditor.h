@@ -75,7 +75,7 @@ public:
     void End();
     bool IsEnded() const { return mbEnded; }
     void CheckWritable(const Place& oPlace = Place::Current()) const;
-    // Ends writing and removes a new file that has not got its name.
+    // Ends writing, removes a new file that has not got its name, and what was added to another since it was committed.
     void Discard() noexcept;
 
 private:
@@ -104,8 +104,9 @@ private:
     std::vector<std::shared_ptr<PageModel>> moPages;
     std::vector<std::weak_ptr<PageWriter>> moWriters;
     std::uint64_t mnNextNumber = 1;
-    std::vector<Extent> moReleased; // of pages that are gone
-    bool mbChanged = false;         // pages came or went
+    std::uint64_t mnCommittedSize = 0; // of the file with all that its committed state may use
+    std::vector<Extent> moReleased;    // of pages that are gone
+    bool mbChanged = false;            // pages came or went
     bool mbEnded = false;
     bool mbNamed = true;
 };

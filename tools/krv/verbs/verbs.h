@@ -27,6 +27,7 @@ void AddStatsVerb(CLI::App& oApp, Selection& oSelection);
 void AddViewVerb(CLI::App& oApp, Selection& oSelection);
 void AddWalkVerb(CLI::App& oApp, Selection& oSelection);
 void AddConvertVerb(CLI::App& oApp, Selection& oSelection);
+void AddOverviewsVerb(CLI::App& oApp, Selection& oSelection);
 void AddDoctorVerb(CLI::App& oApp, Selection& oSelection);
 
 // "1,2,5" as numbers; an empty text is an empty list. Throws UsageError naming the option.

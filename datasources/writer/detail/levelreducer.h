@@ -1,0 +1,122 @@
+#pragma once
+
+#include "datasources/writer/overviewbuilder.h"
+#include "gobs/raster/datatype.h"
+
+#include <cstdint>
+#include <memory>
+#include <vector>
+
+namespace krv::datasources::detail
+{
+
+class LevelTarget;
+
+// A rectangle of pixels; right and bottom are the first ones outside.
+struct PixelBounds
+{
+    unsigned int mnLeft = 0;
+    unsigned int mnTop = 0;
+    unsigned int mnRight = 0;
+    unsigned int mnBottom = 0;
+
+    unsigned int GetWidth() const { return mnRight - mnLeft; }
+    unsigned int GetHeight() const { return mnBottom - mnTop; }
+    bool IsEmpty() const { return mnLeft >= mnRight || mnTop >= mnBottom; }
+    bool Contains(unsigned int nX, unsigned int nY) const
+    {
+        return nX >= mnLeft && nX < mnRight && nY >= mnTop && nY < mnBottom;
+    }
+};
+
+// Pixels of the image, interleaved, rows without padding; for each value a byte, 1 when it is valid and else 0, or null
+// when all are.
+struct SourceWindow
+{
+    PixelBounds moBounds;
+    const unsigned char* mpPixels;
+    const unsigned char* mpValid;
+};
+
+// What all levels have in common.
+struct SourceForm
+{
+    unsigned int mnWidth; // of the image
+    unsigned int mnHeight;
+    unsigned int mnChannels;
+    krv::gobs::DataType moType;
+    bool mbValidity; // windows may come with validity
+
+    std::size_t GetPixelBytes() const { return moType.GetValueBits() / 8 * mnChannels; }
+    // Samples of a pixel: complex values count twice.
+    unsigned int GetSamples() const { return mnChannels * moType.GetParts(); }
+};
+
+// A level that is to be made and the part of it.
+struct LevelTask
+{
+    unsigned int mnFactor;
+    PixelBounds moBounds;
+    LevelTarget* mpoTarget;
+};
+
+// Takes the pixels of the image window by window, row of windows by row of windows, and puts the pixels of levels into
+// their targets as soon as they are known.
+class ILevelReducer
+{
+public:
+    virtual ~ILevelReducer();
+    virtual void Add(const SourceWindow& oWindow) = 0;
+};
+
+// Averages of factors that are powers of two up to 32768, one made from the sums of the other. Windows begin and end at
+// multiples of the largest factor on the x axis, or at the image's edge.
+// oBounds: all the pixels that will come.
+std::unique_ptr<ILevelReducer> MakeAverageCascade(const SourceForm& oForm, const std::vector<LevelTask>& oTasks,
+                                                  const PixelBounds& oBounds, bool bHalfValid);
+
+// Every other level. Windows have all the columns that the level needs.
+std::unique_ptr<ILevelReducer> MakeBoxReducer(const SourceForm& oForm, const LevelTask& oTask, Resampling eMethod,
+                                              const OverviewOptions& oOptions);
+std::unique_ptr<ILevelReducer> MakeKernelReducer(const SourceForm& oForm, const LevelTask& oTask, Resampling eMethod);
+
+// Pixels of the level beyond those whose boxes are touched that a changed pixel of the image has a part in.
+unsigned int GetKernelRadius(Resampling eMethod);
+
+// The pixels of the image that a part of a level depends on.
+PixelBounds GetSourceBounds(const SourceForm& oForm, const LevelTask& oTask, Resampling eMethod);
+
+// Calls oAction with a value of the sample type: of one part for complex types.
+template <typename Action>
+auto ForSampleType(const krv::gobs::DataType& oType, const Action& oAction)
+{
+    switch (oType.GetNativeCode())
+    {
+    case krv::gobs::eDT_8U:
+        return oAction(std::uint8_t{});
+    case krv::gobs::eDT_8S:
+        return oAction(std::int8_t{});
+    case krv::gobs::eDT_16U:
+    case krv::gobs::eDT_C16U:
+        return oAction(std::uint16_t{});
+    case krv::gobs::eDT_16S:
+    case krv::gobs::eDT_C16S:
+        return oAction(std::int16_t{});
+    case krv::gobs::eDT_32U:
+        return oAction(std::uint32_t{});
+    case krv::gobs::eDT_32S:
+    case krv::gobs::eDT_C32S:
+        return oAction(std::int32_t{});
+    case krv::gobs::eDT_64U:
+        return oAction(std::uint64_t{});
+    case krv::gobs::eDT_64S:
+        return oAction(std::int64_t{});
+    case krv::gobs::eDT_32R:
+    case krv::gobs::eDT_C32R:
+        return oAction(float{});
+    default:
+        return oAction(double{});
+    }
+}
+
+} // namespace krv::datasources::detail

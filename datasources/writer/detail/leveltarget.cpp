@@ -1,0 +1,125 @@
+#include "datasources/writer/detail/leveltarget.h"
+
+#include <algorithm>
+#include <cstring>
+#include <utility>
+
+namespace krv::datasources::detail
+{
+
+TileGatherer::TileGatherer(const PixelBounds& oBounds, unsigned int nTileWidth, unsigned int nTileHeight,
+                           unsigned int nChannels, const krv::gobs::DataType& oType, Store oStore)
+    : moBounds(oBounds), mnTileWidth(nTileWidth), mnTileHeight(nTileHeight), mnChannels(nChannels), moType(oType),
+      mnPixelBytes(oType.GetValueBits() / 8 * nChannels), moStore(std::move(oStore))
+{
+}
+
+IValueFinisher::~IValueFinisher() = default;
+
+TileGatherer::Tile& TileGatherer::Get(unsigned int nX, unsigned int nY)
+{
+    if (mpoLast != nullptr && mpoLast->moPart.Contains(nX, nY))
+        return *mpoLast;
+    const unsigned int nColumn = nX / mnTileWidth;
+    const unsigned int nRow = nY / mnTileHeight;
+    Tile& oTile = moTiles[{nRow, nColumn}];
+    mpoLast = &oTile;
+    if (oTile.mpoRaster != nullptr)
+        return oTile;
+    oTile.moPart = GetPart(nColumn, nRow);
+    const unsigned int nWidth = oTile.moPart.GetWidth();
+    const unsigned int nHeight = oTile.moPart.GetHeight();
+    oTile.mpoRaster = std::make_unique<krv::gobs::Raster>(
+        krv::gobs::RasterInfo(nWidth, nHeight, mnChannels, moType),
+        krv::gobs::RasterContext(static_cast<int>(oTile.moPart.mnLeft), static_cast<int>(oTile.moPart.mnTop)));
+    oTile.mnMissing = std::uint64_t{nWidth} * nHeight;
+    return oTile;
+}
+
+// The part of a tile that is to be made.
+PixelBounds TileGatherer::GetPart(unsigned int nColumn, unsigned int nRow) const
+{
+    const auto nRight = std::min<std::uint64_t>(moBounds.mnRight, (std::uint64_t{nColumn} + 1) * mnTileWidth);
+    const auto nBottom = std::min<std::uint64_t>(moBounds.mnBottom, (std::uint64_t{nRow} + 1) * mnTileHeight);
+    return {std::max(moBounds.mnLeft, nColumn * mnTileWidth), std::max(moBounds.mnTop, nRow * mnTileHeight),
+            static_cast<unsigned int>(nRight), static_cast<unsigned int>(nBottom)};
+}
+
+unsigned char* TileGatherer::GetPlace(Tile& oTile, unsigned int nX, unsigned int nY) const
+{
+    const std::size_t nPixel =
+        std::size_t{nY - oTile.moPart.mnTop} * oTile.moPart.GetWidth() + (nX - oTile.moPart.mnLeft);
+    return oTile.mpoRaster->GetBuffer() + nPixel * mnPixelBytes;
+}
+
+unsigned char* TileGatherer::Find(unsigned int nX, unsigned int nY, unsigned int nCount)
+{
+    if (!moBounds.Contains(nX, nY) || !moBounds.Contains(nX + nCount - 1, nY))
+        return nullptr;
+    Tile& oTile = Get(nX, nY);
+    return oTile.moPart.Contains(nX + nCount - 1, nY) ? GetPlace(oTile, nX, nY) : nullptr;
+}
+
+void TileGatherer::Note(unsigned int nX, unsigned int nY, unsigned int nCount)
+{
+    Tile& oTile = Get(nX, nY);
+    oTile.mnMissing -= nCount;
+    if (oTile.mnMissing != 0)
+        return;
+    const std::unique_ptr<krv::gobs::Raster> oRaster = std::move(oTile.mpoRaster);
+    mpoLast = nullptr;
+    moTiles.erase({nY / mnTileHeight, nX / mnTileWidth});
+    moStore(*oRaster);
+}
+
+void TileGatherer::Put(unsigned int nX, unsigned int nY, unsigned int nCount, const unsigned char* pPixels)
+{
+    if (nY < moBounds.mnTop || nY >= moBounds.mnBottom)
+        return;
+    const unsigned int nEnd = std::min(nX + nCount, moBounds.mnRight);
+    for (unsigned int nAt = std::max(nX, moBounds.mnLeft); nAt < nEnd;)
+    {
+        Tile& oTile = Get(nAt, nY);
+        const unsigned int nRun = std::min(nEnd, oTile.moPart.mnRight) - nAt;
+        std::memcpy(GetPlace(oTile, nAt, nY), pPixels + std::size_t{nAt - nX} * mnPixelBytes, nRun * mnPixelBytes);
+        Note(nAt, nY, nRun);
+        nAt += nRun;
+    }
+}
+
+LevelTarget::LevelTarget(TileGatherer oPixels, const SourceForm& oForm, const IValueFinisher* poFinisher)
+    : moPixels(std::move(oPixels)), mpoFinisher(poFinisher), mnChannels(oForm.mnChannels),
+      mnPixelBytes(oForm.GetPixelBytes())
+{
+}
+
+unsigned char* LevelTarget::Begin(unsigned int nX, unsigned int nY, unsigned int nCount)
+{
+    mnX = nX;
+    mnY = nY;
+    mnCount = nCount;
+    mpDirect = moPixels.Find(nX, nY, nCount);
+    if (mpDirect != nullptr)
+        return mpDirect;
+    moRow.resize(std::max(moRow.size(), nCount * mnPixelBytes));
+    return moRow.data();
+}
+
+void LevelTarget::End(const unsigned char* pValid)
+{
+    unsigned char* const pPixels = mpDirect != nullptr ? mpDirect : moRow.data();
+    if (pValid != nullptr)
+        mpoFinisher->Finish(pPixels, pValid, mnCount);
+    if (mpDirect != nullptr)
+        moPixels.Note(mnX, mnY, mnCount);
+    else
+        moPixels.Put(mnX, mnY, mnCount, pPixels);
+    if (mpoMask == nullptr)
+        return;
+    moMaskRow.assign(mnCount, static_cast<unsigned char>(pValid == nullptr));
+    for (std::size_t n = 0; pValid != nullptr && n < std::size_t{mnCount} * mnChannels; ++n)
+        moMaskRow[n / mnChannels] |= pValid[n];
+    mpoMask->Put(mnX, mnY, mnCount, moMaskRow.data());
+}
+
+} // namespace krv::datasources::detail

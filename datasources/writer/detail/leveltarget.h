@@ -1,0 +1,90 @@
+#pragma once
+
+#include "datasources/writer/detail/levelreducer.h"
+#include "gobs/raster/raster.h"
+
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <memory>
+#include <utility>
+#include <vector>
+
+namespace krv::datasources::detail
+{
+
+// Gathers rows of pixels into the tiles of a grid and stores each tile when the last of its pixels has come. Every
+// pixel of the bounds comes once.
+class TileGatherer
+{
+public:
+    using Store = std::function<void(const krv::gobs::Raster& oTile)>;
+
+    TileGatherer(const PixelBounds& oBounds, unsigned int nTileWidth, unsigned int nTileHeight, unsigned int nChannels,
+                 const krv::gobs::DataType& oType, Store oStore);
+
+    // Memory for pixels of a row that lie in one tile and within the bounds; null for others.
+    unsigned char* Find(unsigned int nX, unsigned int nY, unsigned int nCount);
+    // The pixels were written where Find said.
+    void Note(unsigned int nX, unsigned int nY, unsigned int nCount);
+    // Any pixels of a row; those outside the bounds are left out.
+    void Put(unsigned int nX, unsigned int nY, unsigned int nCount, const unsigned char* pPixels);
+
+private:
+    struct Tile
+    {
+        PixelBounds moPart; // of the level
+        std::unique_ptr<krv::gobs::Raster> mpoRaster;
+        std::uint64_t mnMissing = 0; // pixels
+    };
+
+    Tile& Get(unsigned int nX, unsigned int nY);
+    unsigned char* GetPlace(Tile& oTile, unsigned int nX, unsigned int nY) const;
+    PixelBounds GetPart(unsigned int nColumn, unsigned int nRow) const;
+
+    PixelBounds moBounds;
+    unsigned int mnTileWidth;
+    unsigned int mnTileHeight;
+    unsigned int mnChannels;
+    krv::gobs::DataType moType;
+    std::size_t mnPixelBytes;
+    Store moStore;
+    std::map<std::pair<unsigned int, unsigned int>, Tile> moTiles; // that have begun, by row and column
+    Tile* mpoLast = nullptr;                                       // the one used last: rows come in runs
+};
+
+// Gives values that are not valid a value, and keeps valid ones apart from the no-data value.
+class IValueFinisher
+{
+public:
+    virtual ~IValueFinisher();
+    virtual void Finish(unsigned char* pPixels, const unsigned char* pValid, std::size_t nPixels) const = 0;
+};
+
+// Where the pixels of a level go, and those of the mask's level when there is one.
+class LevelTarget
+{
+public:
+    LevelTarget(TileGatherer oPixels, const SourceForm& oForm, const IValueFinisher* poFinisher);
+    void SetMask(std::unique_ptr<TileGatherer> poMask) { mpoMask = std::move(poMask); }
+
+    // Memory for pixels of a row, which End takes. They may reach outside of what is to be made.
+    unsigned char* Begin(unsigned int nX, unsigned int nY, unsigned int nCount);
+    // pValid: a byte per value, or null when all are valid.
+    void End(const unsigned char* pValid);
+
+private:
+    TileGatherer moPixels;
+    std::unique_ptr<TileGatherer> mpoMask;
+    const IValueFinisher* mpoFinisher; // borrowed
+    unsigned int mnChannels;
+    std::size_t mnPixelBytes;
+    std::vector<unsigned char> moRow;
+    std::vector<unsigned char> moMaskRow;
+    unsigned int mnX = 0;
+    unsigned int mnY = 0;
+    unsigned int mnCount = 0;
+    unsigned char* mpDirect = nullptr;
+};
+
+} // namespace krv::datasources::detail

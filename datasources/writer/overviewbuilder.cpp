@@ -1,0 +1,413 @@
+#include "datasources/writer/overviewbuilder.h"
+
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/ioverviewmanager.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/irasterio.h"
+#include "datasources/metadata/auxiliarydata.h"
+#include "datasources/reader/rasteraccess.h"
+#include "datasources/writer/detail/levelreducer.h"
+#include "datasources/writer/detail/leveltarget.h"
+#include "datasources/writer/detail/samplevalidity.h"
+#include "datasources/writer/ioverviewwriteraccessor.h"
+#include "datasources/writer/irasterwriter.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <algorithm>
+#include <bit>
+#include <cctype>
+#include <numeric>
+
+namespace krv::datasources
+{
+
+namespace
+{
+
+using detail::LevelTask;
+using detail::PixelBounds;
+using detail::SourceForm;
+using krv::gobs::Raster;
+
+constexpr const char* NAMES[] = {"NEAREST", "AVERAGE", "MODE", "BILINEAR", "CUBIC", "LANCZOS", "RMS", "MIN", "MAX"};
+constexpr unsigned int MOST_FACTOR = 65536;
+constexpr unsigned int MOST_CASCADE_FACTOR = 32768;
+constexpr unsigned int DEFAULT_SIZE = 256;
+// Windows of the image: no wider than this when they need not be, and no larger than so many bytes.
+constexpr std::uint64_t WINDOW_WIDTH = 4096;
+constexpr std::uint64_t WINDOW_BYTES = std::uint64_t{16} << 20;
+
+unsigned int LevelSize(unsigned int nSize, unsigned int nFactor)
+{
+    return (nSize - 1) / nFactor + 1;
+}
+
+// One level on its way. The writer goes last: the targets store into it.
+struct Level
+{
+    unsigned int mnFactor = 0;
+    bool mbWhole = true;
+    PixelBounds moBounds;
+    std::unique_ptr<IRasterWriter> mpoWriter;
+    std::unique_ptr<IRasterIO> mpoMaskIO;
+    std::unique_ptr<detail::LevelTarget> mpoTarget;
+};
+
+class OverviewBuilder
+{
+public:
+    OverviewBuilder(IRasterWriter& oWriter, Resampling eMethod, const OverviewOptions& oOptions, const Place& oPlace);
+
+    void Prepare(const std::vector<unsigned int>& oFactors);
+    bool Run();
+    void Finish();
+
+private:
+    void FindMask();
+    bool PrepareMask(unsigned int nFactor);
+    PixelBounds GetChanged(unsigned int nFactor) const;
+    void Remove(unsigned int nFactor) const;
+    std::unique_ptr<detail::LevelTarget> MakeTarget(Level& oLevel);
+    void MakeReducers();
+    void AddBounds(const PixelBounds& oPart);
+    bool IsInCascade(unsigned int nFactor) const;
+    bool ReadBand(unsigned int nTop, unsigned int nBottom);
+    void ReadWindow(const PixelBounds& oBounds);
+
+    IRasterWriter& moWriter;
+    Resampling meMethod;
+    const OverviewOptions& moOptions;
+    Place moPlace;
+    IDataset* mpoDataset = nullptr; // borrowed; null when the writer does not show one
+    detail::SampleValidity moValidity;
+    SourceForm moForm;
+    std::unique_ptr<detail::IValueFinisher> mpoFinisher;
+    std::unique_ptr<IOverviewWriterAccessor> mpoAccessor;
+    unsigned int mnMask = 0; // the bitmap that gets levels, or 0
+    std::unique_ptr<IOverviewManager> mpoMaskManager;
+    std::vector<Level> moLevels;
+    std::vector<std::unique_ptr<detail::ILevelReducer>> moReducers;
+    PixelBounds moBounds; // of the pixels that are needed
+    unsigned int mnWindowWidth = 0;
+    std::uint64_t mnDone = 0;
+    std::uint64_t mnTotal = 0;
+};
+
+OverviewBuilder::OverviewBuilder(IRasterWriter& oWriter, Resampling eMethod, const OverviewOptions& oOptions,
+                                 const Place& oPlace)
+    : moWriter(oWriter), meMethod(eMethod), moOptions(oOptions), moPlace(oPlace),
+      moValidity(oWriter, oOptions), moForm{oWriter.GetWidth(), oWriter.GetHeight(), oWriter.GetChansCount(),
+                                            oWriter.GetDataType(), moValidity.IsNeeded()},
+      mpoFinisher(detail::MakeValueFinisher(oWriter.GetAuxiliaryData(), moForm, oOptions.mbNaNIsNoData)),
+      mpoAccessor(oWriter.GetOverviewWriterAccessor())
+{
+    if (const auto* const poAccess = dynamic_cast<const RasterAccess*>(&oWriter))
+        mpoDataset = poAccess->GetDataset();
+    if (moValidity.HasBitmap())
+        FindMask();
+}
+
+// The validity mask is the first bitmap without a description; formats have levels of their first bitmap at least.
+void OverviewBuilder::FindMask()
+{
+    auto& oBitmaps = dynamic_cast<IBitmapDataset&>(*mpoDataset);
+    const std::vector<unsigned int> oList = oBitmaps.GetBitmapList();
+    if (!oBitmaps.GetBitmapDescription(oList.front()).empty())
+        return;
+    mpoMaskManager.reset(oBitmaps.GetBitmapOverviewManager());
+    mnMask = mpoMaskManager != nullptr ? oList.front() : 0;
+}
+
+// Whether the level of the mask was there and can be kept.
+bool OverviewBuilder::PrepareMask(unsigned int nFactor)
+{
+    const std::vector<unsigned int> oExisting = mpoMaskManager->GetLevels();
+    bool bThere = std::find(oExisting.begin(), oExisting.end(), nFactor) != oExisting.end();
+    if (bThere && (mpoMaskManager->GetLevelWidth(nFactor) != LevelSize(moForm.mnWidth, nFactor) ||
+                   mpoMaskManager->GetLevelHeight(nFactor) != LevelSize(moForm.mnHeight, nFactor)))
+    {
+        mpoMaskManager->DeleteLevel(nFactor);
+        bThere = false;
+    }
+    if (!bThere)
+        mpoMaskManager->CreateLevel(nFactor);
+    else
+        mpoMaskManager->SetValid(mnMask, nFactor, false);
+    return bThere;
+}
+
+void OverviewBuilder::Remove(unsigned int nFactor) const
+{
+    auto* const poRaster = dynamic_cast<IRasterDataset*>(mpoDataset);
+    const std::unique_ptr<IOverviewManager> oManager(poRaster != nullptr ? poRaster->GetOverviewManager() : nullptr);
+    if (oManager == nullptr)
+        throw krv::DataException("Level " + std::to_string(nFactor) + " exists in another size", moPlace);
+    oManager->DeleteLevel(nFactor);
+}
+
+// Levels exist and are marked as not valid after this; nothing is written yet.
+void OverviewBuilder::Prepare(const std::vector<unsigned int>& oFactors)
+{
+    const std::vector<unsigned int> oExisting = mpoAccessor->GetLevels();
+    mpoAccessor->SetResamplingName(GetResamplingName(meMethod));
+    for (const unsigned int nFactor : oFactors)
+    {
+        Level& oLevel = moLevels.emplace_back();
+        oLevel.mnFactor = nFactor;
+        const unsigned int nWidth = LevelSize(moForm.mnWidth, nFactor);
+        const unsigned int nHeight = LevelSize(moForm.mnHeight, nFactor);
+        oLevel.mbWhole = std::find(oExisting.begin(), oExisting.end(), nFactor) == oExisting.end();
+        if (!oLevel.mbWhole)
+        {
+            oLevel.mpoWriter.reset(mpoAccessor->CreateRasterWriter(nFactor));
+            if (oLevel.mpoWriter->GetWidth() != nWidth || oLevel.mpoWriter->GetHeight() != nHeight)
+            {
+                oLevel.mpoWriter.reset();
+                Remove(nFactor);
+                oLevel.mbWhole = true;
+            }
+        }
+        if (oLevel.mbWhole)
+            mpoAccessor->CreateLevel(nFactor);
+        else
+            mpoAccessor->SetLevelValid(nFactor, false);
+        if (mnMask != 0 && !PrepareMask(nFactor))
+            oLevel.mbWhole = true;
+        oLevel.moBounds = oLevel.mbWhole ? PixelBounds{0, 0, nWidth, nHeight} : GetChanged(nFactor);
+    }
+    for (Level& oLevel : moLevels)
+    {
+        if (oLevel.mpoWriter == nullptr)
+            oLevel.mpoWriter.reset(mpoAccessor->CreateRasterWriter(oLevel.mnFactor));
+        oLevel.mpoTarget = MakeTarget(oLevel);
+    }
+    MakeReducers();
+}
+
+PixelBounds OverviewBuilder::GetChanged(unsigned int nFactor) const
+{
+    const unsigned int nWidth = LevelSize(moForm.mnWidth, nFactor);
+    const unsigned int nHeight = LevelSize(moForm.mnHeight, nFactor);
+    if (!moOptions.moChanged)
+        return {0, 0, nWidth, nHeight};
+    const OverviewOptions::Rectangle& oPart = *moOptions.moChanged;
+    if (oPart.mnX >= moForm.mnWidth || oPart.mnY >= moForm.mnHeight || oPart.mnWidth == 0 || oPart.mnHeight == 0)
+        return {};
+    const unsigned int nRadius = detail::GetKernelRadius(meMethod);
+    const auto First = [=](unsigned int nAt)
+    {
+        return nAt / nFactor - std::min(nAt / nFactor, nRadius);
+    };
+    const auto End = [=](unsigned int nAt, unsigned int nLength, unsigned int nSize, unsigned int nLevelSize)
+    {
+        const std::uint64_t nEnd = std::min<std::uint64_t>(std::uint64_t{nAt} + nLength, nSize);
+        return static_cast<unsigned int>(std::min<std::uint64_t>((nEnd + nFactor - 1) / nFactor + nRadius, nLevelSize));
+    };
+    return {First(oPart.mnX), First(oPart.mnY), End(oPart.mnX, oPart.mnWidth, moForm.mnWidth, nWidth),
+            End(oPart.mnY, oPart.mnHeight, moForm.mnHeight, nHeight)};
+}
+
+std::unique_ptr<detail::LevelTarget> OverviewBuilder::MakeTarget(Level& oLevel)
+{
+    IRasterWriter& oWriter = *oLevel.mpoWriter;
+    auto oTarget = std::make_unique<detail::LevelTarget>(
+        detail::TileGatherer(oLevel.moBounds, oWriter.GetTileWidth(), oWriter.GetTileHeight(), moForm.mnChannels,
+                             moForm.moType, [&oWriter](const Raster& oTile) { oWriter.WriteRaster(&oTile); }),
+        moForm, mpoFinisher.get());
+    if (mnMask == 0)
+        return oTarget;
+    oLevel.mpoMaskIO.reset(mpoMaskManager->GetOverviewIO(oLevel.mnFactor, {mnMask}));
+    IRasterIO& oIO = *oLevel.mpoMaskIO;
+    const auto Store = [&oIO](const Raster& oTile)
+    {
+        oIO.WriteWindow(static_cast<unsigned int>(oTile.GetX()), static_cast<unsigned int>(oTile.GetY()),
+                        oTile.GetWidth(), oTile.GetHeight(), const_cast<unsigned char*>(oTile.GetBuffer()));
+    };
+    oTarget->SetMask(std::make_unique<detail::TileGatherer>(oLevel.moBounds, oIO.GetTileWidth(), oIO.GetTileHeight(), 1,
+                                                            krv::gobs::eDT_8U, Store));
+    return oTarget;
+}
+
+bool OverviewBuilder::IsInCascade(unsigned int nFactor) const
+{
+    return meMethod == Resampling::eAverage && std::has_single_bit(nFactor) && nFactor <= MOST_CASCADE_FACTOR &&
+           !(moForm.moType.IsComplex() && moOptions.mbPower);
+}
+
+void OverviewBuilder::AddBounds(const PixelBounds& oPart)
+{
+    if (moBounds.IsEmpty())
+        moBounds = oPart;
+    moBounds = {std::min(moBounds.mnLeft, oPart.mnLeft), std::min(moBounds.mnTop, oPart.mnTop),
+                std::max(moBounds.mnRight, oPart.mnRight), std::max(moBounds.mnBottom, oPart.mnBottom)};
+}
+
+// A cascade takes windows that begin at multiples of its largest factor, everything else whole rows.
+void OverviewBuilder::MakeReducers()
+{
+    std::vector<LevelTask> oCascade;
+    unsigned int nUnit = 1;
+    for (const Level& oLevel : moLevels)
+    {
+        const LevelTask oTask{oLevel.mnFactor, oLevel.moBounds, oLevel.mpoTarget.get()};
+        if (oTask.moBounds.IsEmpty())
+            continue;
+        AddBounds(detail::GetSourceBounds(moForm, oTask, meMethod));
+        if (IsInCascade(oTask.mnFactor))
+        {
+            oCascade.push_back(oTask);
+            nUnit = std::max(nUnit, oTask.mnFactor);
+        }
+        else if (detail::GetKernelRadius(meMethod) != 0)
+            moReducers.push_back(detail::MakeKernelReducer(moForm, oTask, meMethod));
+        else
+            moReducers.push_back(detail::MakeBoxReducer(moForm, oTask, meMethod, moOptions));
+    }
+    const auto RoundUp = [nUnit](unsigned int nAt, unsigned int nSize)
+    {
+        return static_cast<unsigned int>(
+            std::min<std::uint64_t>((std::uint64_t{nAt} + nUnit - 1) / nUnit * nUnit, nSize));
+    };
+    moBounds = {moBounds.mnLeft / nUnit * nUnit, moBounds.mnTop / nUnit * nUnit,
+                RoundUp(moBounds.mnRight, moForm.mnWidth), RoundUp(moBounds.mnBottom, moForm.mnHeight)};
+    mnTotal = std::uint64_t{moBounds.GetWidth()} * moBounds.GetHeight();
+    mnWindowWidth = moBounds.GetWidth();
+    const std::uint64_t nAligned = std::lcm<std::uint64_t>(moWriter.GetTileWidth(), nUnit);
+    if (moReducers.empty() && nAligned <= WINDOW_WIDTH)
+        mnWindowWidth = static_cast<unsigned int>(nAligned);
+    if (!oCascade.empty())
+        moReducers.push_back(detail::MakeAverageCascade(moForm, oCascade, moBounds, moOptions.mbHalfValid));
+}
+
+void OverviewBuilder::ReadWindow(const PixelBounds& oBounds)
+{
+    Raster oRaster({oBounds.GetWidth(), oBounds.GetHeight(), moForm.mnChannels, moForm.moType},
+                   {static_cast<int>(oBounds.mnLeft), static_cast<int>(oBounds.mnTop)});
+    moWriter.ReadRaster(&oRaster);
+    const unsigned char* const pValid = moForm.mbValidity ? moValidity.Mark(oRaster) : nullptr;
+    for (const auto& oReducer : moReducers)
+        oReducer->Add({oBounds, oRaster.GetBuffer(), pValid});
+    mnDone += std::uint64_t{oBounds.GetWidth()} * oBounds.GetHeight();
+}
+
+bool OverviewBuilder::ReadBand(unsigned int nTop, unsigned int nBottom)
+{
+    for (unsigned int nLeft = moBounds.mnLeft; nLeft < moBounds.mnRight;)
+    {
+        const std::uint64_t nRight = (std::uint64_t{nLeft} / mnWindowWidth + 1) * mnWindowWidth;
+        const bool bWhole = mnWindowWidth == moBounds.GetWidth();
+        const PixelBounds oWindow{nLeft, nTop,
+                                  bWhole ? moBounds.mnRight
+                                         : static_cast<unsigned int>(std::min<std::uint64_t>(nRight, moBounds.mnRight)),
+                                  nBottom};
+        ReadWindow(oWindow);
+        if (moOptions.moProgress && !moOptions.moProgress(mnDone, mnTotal))
+            return false;
+        nLeft = oWindow.mnRight;
+    }
+    return true;
+}
+
+// Bands end with the rows of tiles, unless these are too high.
+bool OverviewBuilder::Run()
+{
+    const std::uint64_t nRowBytes = std::max<std::uint64_t>(1, mnWindowWidth * moForm.GetPixelBytes());
+    const std::uint64_t nMostRows = std::max<std::uint64_t>(1, WINDOW_BYTES / nRowBytes);
+    const std::uint64_t nTileHeight = moWriter.GetTileHeight();
+    for (unsigned int nTop = moBounds.mnTop; nTop < moBounds.mnBottom;)
+    {
+        const std::uint64_t nTileEnd = (nTop / nTileHeight + 1) * nTileHeight;
+        const auto nBottom = static_cast<unsigned int>(
+            std::min<std::uint64_t>({nTileEnd, nTop + nMostRows, std::uint64_t{moBounds.mnBottom}}));
+        if (!ReadBand(nTop, nBottom))
+            return false;
+        nTop = nBottom;
+    }
+    return true;
+}
+
+void OverviewBuilder::Finish()
+{
+    moReducers.clear();
+    for (Level& oLevel : moLevels)
+    {
+        oLevel.mpoTarget.reset();
+        oLevel.mpoMaskIO.reset();
+        oLevel.mpoWriter.reset();
+        if (mnMask != 0)
+            mpoMaskManager->SetValid(mnMask, oLevel.mnFactor, true);
+        mpoAccessor->SetLevelValid(oLevel.mnFactor, true);
+    }
+}
+
+std::vector<unsigned int> CheckFactors(const std::vector<unsigned int>& oLevels, const IRasterWriter& oWriter,
+                                       const Place& oPlace)
+{
+    const auto Refuse = [&oPlace](const std::string& message)
+    {
+        throw krv::ParameterException(message, krv::ParameterException::eInvalidValue, "oLevels", oPlace);
+    };
+    if (oLevels.empty())
+        Refuse("No levels to build");
+    std::vector<unsigned int> oFactors = oLevels;
+    std::sort(oFactors.begin(), oFactors.end());
+    oFactors.erase(std::unique(oFactors.begin(), oFactors.end()), oFactors.end());
+    const unsigned int nLongest = std::max(oWriter.GetWidth(), oWriter.GetHeight());
+    const unsigned int nMost = std::min(MOST_FACTOR, std::bit_ceil(std::min(nLongest, MOST_FACTOR)));
+    if (oFactors.front() < 2 || oFactors.back() > nMost)
+        Refuse("Levels of an image of " + std::to_string(oWriter.GetWidth()) + " x " +
+               std::to_string(oWriter.GetHeight()) + " pixels are factors from 2 to " + std::to_string(nMost) +
+               ", not " + std::to_string(oFactors.front() < 2 ? oFactors.front() : oFactors.back()));
+    return oFactors;
+}
+
+} // namespace
+
+Resampling ParseResampling(const std::string& name)
+{
+    std::string upper = name;
+    for (char& nCharacter : upper)
+        nCharacter = static_cast<char>(std::toupper(static_cast<unsigned char>(nCharacter)));
+    const auto* const pFound = std::find(std::begin(NAMES), std::end(NAMES), upper);
+    if (pFound == std::end(NAMES))
+        throw krv::ParameterException("The resampling method " + name + " is not known",
+                                      krv::ParameterException::eInvalidValue, "name");
+    return static_cast<Resampling>(pFound - std::begin(NAMES));
+}
+
+std::string GetResamplingName(Resampling eMethod)
+{
+    return NAMES[static_cast<int>(eMethod)];
+}
+
+std::vector<unsigned int> GetDefaultLevels(unsigned int nWidth, unsigned int nHeight)
+{
+    const unsigned int nLongest = std::max(nWidth, nHeight);
+    std::vector<unsigned int> oLevels;
+    for (unsigned int nFactor = 2; nLongest >= DEFAULT_SIZE && nFactor <= MOST_FACTOR; nFactor *= 2)
+    {
+        oLevels.push_back(nFactor);
+        if (LevelSize(nLongest, nFactor) < DEFAULT_SIZE)
+            break;
+    }
+    return oLevels;
+}
+
+bool BuildOverviews(IRasterWriter& oWriter, const std::vector<unsigned int>& oLevels, const std::string& method,
+                    const OverviewOptions& oOptions)
+{
+    const Place oPlace = Place::Current();
+    const Resampling eMethod = ParseResampling(method);
+    if (std::unique_ptr<IOverviewWriterAccessor>(oWriter.GetOverviewWriterAccessor()) == nullptr)
+        throw krv::DataException("Overviews are built of image channels at full size", oPlace);
+    const std::vector<unsigned int> oFactors = CheckFactors(oLevels, oWriter, oPlace);
+    OverviewBuilder oBuilder(oWriter, eMethod, oOptions, oPlace);
+    oBuilder.Prepare(oFactors);
+    if (!oBuilder.Run())
+        return false;
+    oBuilder.Finish();
+    return true;
+}
+
+} // namespace krv::datasources

@@ -1,0 +1,109 @@
+// krv overviews as users run it.
+
+#include "tests/support/tempfolder.h"
+#include "tests/tools/programrun.h"
+
+#include <gtest/gtest.h>
+#include <tiffio.h>
+
+#include <algorithm>
+#include <memory>
+
+namespace krv::tool
+{
+
+namespace
+{
+
+using krv::test::ProgramRun;
+using krv::test::ReadFile;
+using krv::test::RunKrv;
+using krv::test::RunProgram;
+using krv::test::TempFolder;
+
+// One 8-bit channel in strips of 16 rows, as libtiff alone writes it.
+std::string MakeFile(const TempFolder& oFolder, unsigned int nSize, bool bTable)
+{
+    const std::string file = oFolder.File("image.tif");
+    const std::unique_ptr<TIFF, decltype(&TIFFClose)> oTiff(TIFFOpen(file.c_str(), "w"), &TIFFClose);
+    TIFFSetField(oTiff.get(), TIFFTAG_IMAGEWIDTH, nSize);
+    TIFFSetField(oTiff.get(), TIFFTAG_IMAGELENGTH, nSize);
+    TIFFSetField(oTiff.get(), TIFFTAG_BITSPERSAMPLE, 8);
+    TIFFSetField(oTiff.get(), TIFFTAG_ROWSPERSTRIP, 16);
+    TIFFSetField(oTiff.get(), TIFFTAG_PHOTOMETRIC, bTable ? PHOTOMETRIC_PALETTE : PHOTOMETRIC_MINISBLACK);
+    std::vector<unsigned short> oColours(256);
+    if (bTable)
+        TIFFSetField(oTiff.get(), TIFFTAG_COLORMAP, oColours.data(), oColours.data(), oColours.data());
+    std::vector<unsigned char> oRow(nSize);
+    for (unsigned int nY = 0; nY < nSize; ++nY)
+    {
+        for (unsigned int nX = 0; nX < nSize; ++nX)
+            oRow[nX] = static_cast<unsigned char>(nX / 2 + nY);
+        TIFFWriteScanline(oTiff.get(), oRow.data(), nY, 0);
+    }
+    return file;
+}
+
+} // namespace
+
+TEST(OverviewsVerb, LevelsAreThereForLibtiffToo)
+{
+    const TempFolder oFolder;
+    const std::string file = MakeFile(oFolder, 600, false);
+    const ProgramRun oRun = RunKrv({"overviews", file});
+    ASSERT_EQ(oRun.code, 0) << oRun.errors;
+    EXPECT_EQ(oRun.output, "level 2: 300 x 300\nlevel 4: 150 x 150\n");
+    EXPECT_EQ(RunKrv({"overviews", file, "--levels", "3", "--resampling", "Lanczos"}).code, 0);
+    EXPECT_EQ(RunKrv({"info", file, "--json"}).Json()["overviews"].size(), 3u);
+
+    const std::unique_ptr<TIFF, decltype(&TIFFClose)> oTiff(TIFFOpen(file.c_str(), "r"), &TIFFClose);
+    ASSERT_EQ(TIFFSetDirectory(oTiff.get(), 1), 1);
+    unsigned int nKind = 0;
+    TIFFGetField(oTiff.get(), TIFFTAG_SUBFILETYPE, &nKind);
+    EXPECT_EQ(nKind, static_cast<unsigned int>(FILETYPE_REDUCEDIMAGE));
+    std::vector<unsigned char> oRow(300);
+    ASSERT_EQ(TIFFReadScanline(oTiff.get(), oRow.data(), 10, 0), 1);
+    for (unsigned int nX = 0; nX < 200; ++nX)
+        ASSERT_EQ(oRow[nX], nX + 20 + nX % 2) << nX; // halves to the even side
+}
+
+TEST(OverviewsVerb, RefusalsLeaveTheFileAsItIs)
+{
+    const TempFolder oFolder;
+    const std::string file = MakeFile(oFolder, 300, true);
+    const std::string before = ReadFile(file);
+    const struct
+    {
+        std::vector<std::string> moArguments;
+        int mnCode;
+        const char* mpWord;
+    } CASES[] = {
+        {{"overviews", file, "--resampling", "average"}, 2, "colour table"},
+        {{"overviews", file, "--resampling", "best"}, 2, "best"},
+        {{"overviews", file, "--levels", "2,x"}, 2, "--levels"},
+        {{"overviews", file, "--levels", "1"}, 1, "factors from 2"},
+        {{"overviews", file, "--changed", "1,2"}, 2, "--changed"},
+        {{"overviews", oFolder.File("none.tif")}, 1, "no such file"},
+    };
+    for (const auto& oCase : CASES)
+    {
+        const ProgramRun oRun = RunKrv(oCase.moArguments);
+        EXPECT_EQ(oRun.code, oCase.mnCode) << oRun.errors;
+        EXPECT_NE(oRun.errors.find(oCase.mpWord), std::string::npos) << oRun.errors;
+    }
+    EXPECT_EQ(ReadFile(file), before);
+    EXPECT_EQ(RunKrv({"overviews", file}).code, 0); // by mode, without being told
+}
+
+TEST(OverviewsVerb, InterruptStopsCleanly)
+{
+    const TempFolder oFolder;
+    const std::string file = MakeFile(oFolder, 6000, false);
+    const std::string before = ReadFile(file);
+    const ProgramRun oRun = RunProgram(KRV_PROGRAM, {"overviews", file, "--resampling", "lanczos"}, {}, 300);
+    EXPECT_EQ(oRun.code, 1);
+    EXPECT_EQ(oRun.errors, "krv: stopped\n");
+    EXPECT_TRUE(ReadFile(file) == before);
+}
+
+} // namespace krv::tool

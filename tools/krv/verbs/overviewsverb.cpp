@@ -1,0 +1,156 @@
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "datasources/writer/basicwriter.h"
+#include "datasources/writer/overviewbuilder.h"
+#include "toolkit/exceptions/exceptions.h"
+#include "tools/krv/errors.h"
+#include "tools/krv/jsontext.h"
+#include "tools/krv/progress.h"
+#include "tools/krv/sourcefile.h"
+#include "tools/krv/verbs/verbs.h"
+
+#include <CLI/CLI.hpp>
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <memory>
+
+namespace krv::tool
+{
+
+namespace
+{
+
+using krv::datasources::BasicWriter;
+using krv::datasources::IDataset;
+using krv::datasources::OverviewOptions;
+using krv::datasources::Resampling;
+
+struct Options
+{
+    std::string levels;
+    std::string resampling;
+    std::string changed;
+    OverviewOptions building;
+};
+
+// Mixing the indices of a colour table gives colours that mean nothing.
+bool IsIndexed(IDataset& oDataset)
+{
+    const auto* const poTables = dynamic_cast<krv::datasources::IPCTDataset*>(&oDataset);
+    return poTables != nullptr && !poTables->GetPCTList().empty();
+}
+
+std::string ChooseMethod(const std::string& file, const std::string& wanted, bool bIndexed)
+{
+    if (wanted.empty())
+        return bIndexed ? "mode" : "average";
+    const Resampling eMethod = krv::datasources::ParseResampling(wanted);
+    if (bIndexed && eMethod != Resampling::eNearest && eMethod != Resampling::eMode)
+        throw UsageError(file + ": its pixels are indices of a colour table; use --resampling mode or nearest");
+    return wanted;
+}
+
+void SetChanged(const std::string& text, OverviewOptions& oOptions)
+{
+    const auto oNumbers = ParseNumbers(text, "--changed");
+    if (oNumbers.empty())
+        return;
+    if (oNumbers.size() != 4)
+        throw UsageError("--changed: \"" + text + "\" is not x,y,width,height");
+    oOptions.moChanged = OverviewOptions::Rectangle{oNumbers[0], oNumbers[1], oNumbers[2], oNumbers[3]};
+}
+
+std::unique_ptr<IDataset> OpenForUpdate(const std::string& file)
+{
+    std::unique_ptr<IDataset> poDataset(krv::datasources::DatasetManager::GetInstance()->Open(file, eUpdate));
+    if (poDataset == nullptr)
+        throw krv::DataException(file + ": its format cannot update files");
+    return poDataset;
+}
+
+void Build(BasicWriter& oWriter, const std::vector<unsigned int>& oLevels, const std::string& method,
+           OverviewOptions oOptions)
+{
+    const std::uint64_t nPixelBytes = oWriter.GetDataType().GetValueBits() / 8 * oWriter.GetChansCount();
+    std::unique_ptr<Progress> poProgress;
+    oOptions.moProgress = [&](std::uint64_t nDone, std::uint64_t nTotal)
+    {
+        if (poProgress == nullptr)
+            poProgress = std::make_unique<Progress>("overviews", nTotal * nPixelBytes);
+        poProgress->Advance(nDone * nPixelBytes - poProgress->GetDone());
+        return true;
+    };
+    krv::datasources::BuildOverviews(oWriter, oLevels, method, oOptions);
+}
+
+int RunOverviews(const std::string& file, Options& oOptions)
+{
+    auto oLevels = ParseNumbers(oOptions.levels, "--levels");
+    SetChanged(oOptions.changed, oOptions.building);
+    std::vector<ChannelGroup> oGroups;
+    std::string method;
+    unsigned int nWidth = 0, nHeight = 0;
+    {
+        const SourceFile oFile(file);
+        nWidth = oFile.GetRaster().GetWidth();
+        nHeight = oFile.GetRaster().GetHeight();
+        oGroups = oFile.GroupByType(oFile.CheckChannels({}));
+        method = ChooseMethod(file, oOptions.resampling, IsIndexed(oFile.GetDataset()));
+    }
+    if (oLevels.empty())
+        oLevels = krv::datasources::GetDefaultLevels(nWidth, nHeight);
+    if (oLevels.empty())
+    {
+        Print(fmt::format("{}: {} x {} pixels need no overviews\n", file, nWidth, nHeight));
+        return 0;
+    }
+    const std::unique_ptr<IDataset> poDataset = OpenForUpdate(file);
+    for (const ChannelGroup& oGroup : oGroups)
+    {
+        BasicWriter oWriter(dynamic_cast<krv::datasources::IRasterDataset*>(poDataset.get()), oGroup.channels);
+        Build(oWriter, oLevels, method, oOptions.building);
+    }
+    poDataset->Synchronize();
+    std::sort(oLevels.begin(), oLevels.end());
+    oLevels.erase(std::unique(oLevels.begin(), oLevels.end()), oLevels.end());
+    for (const unsigned int nLevel : oLevels)
+        Print(fmt::format("level {}: {} x {}\n", nLevel, (nWidth - 1) / nLevel + 1, (nHeight - 1) / nLevel + 1));
+    return 0;
+}
+
+} // namespace
+
+void AddOverviewsVerb(CLI::App& oApp, Selection& oSelection)
+{
+    auto* const poVerb = oApp.add_subcommand("overviews", "Builds the overview levels of a file in one pass over it");
+    const auto poOptions = std::make_shared<Options>();
+    poVerb->add_option("FILE", oSelection.file, "The file; it is changed in place")->required();
+    poVerb->add_option("--levels", poOptions->levels,
+                       "Reduction factors: 2,4,8,16 (powers of two, until a level is below 256 pixels)");
+    poVerb
+        ->add_option("--resampling", poOptions->resampling,
+                     "average (mode for indices of a colour table), nearest, mode, bilinear, cubic, lanczos, rms, min, "
+                     "max")
+        ->check(CLI::IsMember({"average", "nearest", "mode", "bilinear", "cubic", "lanczos", "rms", "min", "max"},
+                              CLI::ignore_case));
+    poVerb->add_option("--changed", poOptions->changed,
+                       "x,y,width,height: only this part of the image changed since its levels were built");
+    poVerb->add_flag("--half-valid", poOptions->building.mbHalfValid,
+                     "A pixel counts as valid when half of its source pixels are, instead of one");
+    poVerb->add_flag("--nan-is-nodata", poOptions->building.mbNaNIsNoData, "Values that are no numbers are not valid");
+    poVerb->add_flag("--power", poOptions->building.mbPower, "Average the power of complex values, not their parts");
+    poVerb->footer("No-data values, masks and alpha are respected. Stopped or failed, the file keeps what it had.");
+    poVerb->callback(
+        [&oSelection, poOptions]
+        {
+            oSelection.run = [&oSelection, poOptions]
+            {
+                return RunOverviews(oSelection.file, *poOptions);
+            };
+        });
+}
+
+} // namespace krv::tool
