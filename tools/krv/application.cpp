@@ -93,6 +93,7 @@ int RunApplication(int nArguments, char** pArguments)
     AddWalkVerb(oApp, oSelection);
     AddConvertVerb(oApp, oSelection);
     AddOverviewsVerb(oApp, oSelection);
+    AddMaskVerb(oApp, oSelection);
     AddDoctorVerb(oApp, oSelection);
     oApp.footer(FOOTER); // after the verbs, which would take it over
     try

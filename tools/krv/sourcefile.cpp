@@ -23,10 +23,10 @@ using krv::datasources::IRasterReader;
 namespace
 {
 
-std::unique_ptr<krv::datasources::IDataset> OpenDataset(const std::string& name)
+std::unique_ptr<krv::datasources::IDataset> OpenDataset(const std::string& name, AccessMode eMode)
 {
     std::unique_ptr<krv::datasources::IDataset> poDataset(
-        krv::datasources::DatasetManager::GetInstance()->Open(name, eReadOnly));
+        krv::datasources::DatasetManager::GetInstance()->Open(name, eMode));
     if (poDataset == nullptr)
         throw krv::FileFormatException(name, "its format recognised it and then opened nothing");
     return poDataset;
@@ -55,8 +55,8 @@ LevelReader::LevelReader(std::unique_ptr<IRasterReader> poFull, std::unique_ptr<
 LevelReader::LevelReader(LevelReader&&) noexcept = default;
 LevelReader::~LevelReader() = default;
 
-SourceFile::SourceFile(const std::string& name)
-    : moName(name), mpoDataset(OpenDataset(name)),
+SourceFile::SourceFile(const std::string& name, AccessMode eMode)
+    : moName(name), mpoDataset(OpenDataset(name, eMode)),
       mpoRaster(dynamic_cast<krv::datasources::IRasterDataset*>(mpoDataset.get())),
       moMetadata(mpoDataset->ReadAuxiliaryData())
 {

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "datasources/interfaces/accessmode.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/raster/datatype.h"
 #include "tools/krv/nodatamatch.h"
@@ -45,12 +46,12 @@ struct ChannelGroup
     std::vector<std::size_t> positions;
 };
 
-// A file opened for reading. Readers live at most as long as it.
+// An open file. Readers live at most as long as it.
 class SourceFile
 {
 public:
     // Passes what the manager throws.
-    explicit SourceFile(const std::string& name);
+    explicit SourceFile(const std::string& name, AccessMode eMode = eReadOnly);
     ~SourceFile();
 
     const std::string& GetName() const { return moName; }

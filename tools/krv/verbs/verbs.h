@@ -28,6 +28,7 @@ void AddViewVerb(CLI::App& oApp, Selection& oSelection);
 void AddWalkVerb(CLI::App& oApp, Selection& oSelection);
 void AddConvertVerb(CLI::App& oApp, Selection& oSelection);
 void AddOverviewsVerb(CLI::App& oApp, Selection& oSelection);
+void AddMaskVerb(CLI::App& oApp, Selection& oSelection);
 void AddDoctorVerb(CLI::App& oApp, Selection& oSelection);
 
 // "1,2,5" as numbers; an empty text is an empty list. Throws UsageError naming the option.

@@ -1,0 +1,51 @@
+#pragma once
+
+#include "gobs/mask/maskdecision.h"
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace krv::tool
+{
+
+// What the coordinates of polygons are. eAsWritten: pixels and map units of the file for WKT are map units, GeoJSON is
+// longitude and latitude, unless the text names a system of its own.
+enum class PolygonCoordinates
+{
+    eAsWritten,
+    ePixels,  // continuous, (0, 0) the outer corner of the first pixel
+    eMap,     // of the file's own reference system
+    eNamedMap // of another one
+};
+
+// A mask is made of one kind of source: polygons, bitmaps (union) or the recorded no-data values.
+struct MaskRequest
+{
+    std::vector<std::string> polygons; // texts or files, see ReadPolygons
+    PolygonCoordinates coordinates = PolygonCoordinates::eAsWritten;
+    std::string crs; // for eNamedMap: a code such as EPSG:32719 or a definition
+    std::vector<unsigned int> bitmaps;
+    bool noData = false;
+    krv::gobs::BkgdRule rule = krv::gobs::eAnyChannel;
+    std::vector<unsigned int> channels; // of the no-data values; empty: all
+    std::optional<unsigned int> target; // the bitmap to write, 0 for a new one
+    std::string picture;                // a PNG file to draw
+    unsigned int pictureSize = 1024;
+};
+
+struct MaskResult
+{
+    std::uint64_t set = 0;
+    std::uint64_t pixels = 0;
+    unsigned int bitmap = 0; // the one that was written, 0 for none
+    bool complement = false; // whether it holds the complement: set = valid
+};
+
+// Makes the mask tile by tile. Bits set are inside a polygon, set in a bitmap, or no-data; a picture shows them white.
+// A bitmap of the file gets them as they are but for no-data, where it gets the complement, set = valid, as mask
+// bitmaps are read everywhere. When something fails the file stays as it was.
+MaskResult MakeMask(const std::string& file, const MaskRequest& oRequest);
+
+} // namespace krv::tool

@@ -1,0 +1,305 @@
+#include "tools/krv/polygontext.h"
+
+#include "toolkit/nspio/warning.h"
+#include "tools/krv/errors.h"
+
+#include <fmt/format.h>
+#include <nlohmann/json.hpp>
+
+#include <algorithm>
+#include <cctype>
+#include <charconv>
+#include <cmath>
+#include <fstream>
+#include <iterator>
+#include <string_view>
+
+namespace krv::tool
+{
+
+namespace
+{
+
+using nlohmann::json;
+using Ring = std::vector<GDBVertex>;
+using Rings = std::vector<Ring>;
+
+constexpr unsigned int DEEPEST = 32;
+
+bool IsBlank(char c)
+{
+    return std::isspace(static_cast<unsigned char>(c)) != 0;
+}
+
+class WktParser
+{
+public:
+    explicit WktParser(std::string_view text) : moText(text) {}
+
+    void Parse(PolygonText& oResult)
+    {
+        for (SkipBlanks(); mnAt < moText.size(); SkipBlanks())
+        {
+            std::string word = Word();
+            while (word.ends_with('Z') || word.ends_with('M'))
+                word.pop_back();
+            if (word == "SRID" && Take('='))
+                oResult.crs = fmt::format("EPSG:{}", Number());
+            else if (word == "POLYGON" || word == "MULTIPOLYGON")
+                Geometry(word == "MULTIPOLYGON", oResult);
+            else
+                Fail("POLYGON or MULTIPOLYGON");
+            while (Take(';') || Take(','))
+                ;
+        }
+    }
+
+private:
+    [[noreturn]] void Fail(const char* pExpected) const
+    {
+        throw UsageError(fmt::format("{} is expected at character {} of the polygon text, not \"{}\"", pExpected,
+                                     mnAt + 1, moText.substr(std::min(mnAt, moText.size()), 20)));
+    }
+
+    void SkipBlanks()
+    {
+        while (mnAt < moText.size() && IsBlank(moText[mnAt]))
+            ++mnAt;
+    }
+
+    bool Take(char c)
+    {
+        SkipBlanks();
+        const bool bThere = mnAt < moText.size() && moText[mnAt] == c;
+        mnAt += bThere ? 1 : 0;
+        return bThere;
+    }
+
+    void Expect(char c, const char* pExpected)
+    {
+        if (!Take(c))
+            Fail(pExpected);
+    }
+
+    std::string Word()
+    {
+        SkipBlanks();
+        std::string word;
+        for (; mnAt < moText.size() && std::isalpha(static_cast<unsigned char>(moText[mnAt])) != 0; ++mnAt)
+            word += static_cast<char>(std::toupper(static_cast<unsigned char>(moText[mnAt])));
+        return word;
+    }
+
+    double Number()
+    {
+        SkipBlanks();
+        double nValue = 0;
+        const char* const pFrom = moText.data() + mnAt;
+        const auto [pEnd, eError] = std::from_chars(pFrom, moText.data() + moText.size(), nValue);
+        if (eError != std::errc() || !std::isfinite(nValue))
+            Fail("a number");
+        mnAt += static_cast<std::size_t>(pEnd - pFrom);
+        return nValue;
+    }
+
+    bool AtNumber()
+    {
+        SkipBlanks();
+        return mnAt < moText.size() && (std::isdigit(static_cast<unsigned char>(moText[mnAt])) != 0 ||
+                                        moText[mnAt] == '-' || moText[mnAt] == '.');
+    }
+
+    // Calls oMember for each member of a list in brackets.
+    template <typename Member>
+    void List(const Member& oMember)
+    {
+        Expect('(', "(");
+        do
+            oMember();
+        while (Take(','));
+        Expect(')', ", or )");
+    }
+
+    void Geometry(bool bSeveral, PolygonText& oResult)
+    {
+        std::string word = Word();
+        if (word == "Z" || word == "M" || word == "ZM")
+            word = Word();
+        if (word == "EMPTY")
+            return;
+        const auto Polygon = [&]
+        {
+            Rings& oRings = oResult.polygons.emplace_back();
+            List([&] { ParseRing(oRings.emplace_back()); });
+        };
+        if (bSeveral)
+            List(Polygon);
+        else
+            Polygon();
+    }
+
+    void ParseRing(Ring& oRing)
+    {
+        List(
+            [&]
+            {
+                const double nX = Number();
+                oRing.push_back({nX, Number()});
+                for (int i = 0; i < 2 && AtNumber(); ++i)
+                    Number(); // height and measure
+            });
+    }
+
+    std::string_view moText;
+    std::size_t mnAt = 0;
+};
+
+class GeoJsonReader
+{
+public:
+    explicit GeoJsonReader(PolygonText& oResult) : moResult(oResult) {}
+
+    void Read(const json& oObject, unsigned int nDepth = 0)
+    {
+        if (oObject.is_null()) // a feature without a place
+            return;
+        if (!oObject.is_object() || !oObject.contains("type") || !oObject["type"].is_string())
+            Fail("an object has no \"type\"");
+        if (nDepth > DEEPEST)
+            Fail("collections are nested too deep");
+        const std::string type = oObject["type"].get<std::string>();
+        if (type == "FeatureCollection")
+            ReadAll(oObject, "features", nDepth);
+        else if (type == "GeometryCollection")
+            ReadAll(oObject, "geometries", nDepth);
+        else if (type == "Feature")
+            Read(Member(oObject, "geometry"), nDepth + 1);
+        else if (type == "Polygon")
+            ReadPolygon(Member(oObject, "coordinates"));
+        else if (type == "MultiPolygon")
+        {
+            for (const json& oPolygon : List(Member(oObject, "coordinates")))
+                ReadPolygon(oPolygon);
+        }
+        else
+            krv::nspio::Warning::Warn("GeoJSON of type \"" + type + "\" is no polygon and is left out",
+                                      "tools/krv/polygontext", 0);
+        if (nDepth == 0 && oObject.contains("crs") && !oObject["crs"].is_null())
+            ReadCrs(oObject["crs"]);
+    }
+
+private:
+    [[noreturn]] static void Fail(const std::string& what) { throw UsageError("the GeoJSON is not valid: " + what); }
+
+    static const json& Member(const json& oObject, const char* pName)
+    {
+        if (!oObject.contains(pName))
+            Fail(std::string("there is no \"") + pName + "\"");
+        return oObject[pName];
+    }
+
+    static const json& List(const json& oList)
+    {
+        if (!oList.is_array())
+            Fail("something is no list that should be one");
+        return oList;
+    }
+
+    void ReadAll(const json& oObject, const char* pName, unsigned int nDepth)
+    {
+        for (const json& oMember : List(Member(oObject, pName)))
+            Read(oMember, nDepth + 1);
+    }
+
+    void ReadPolygon(const json& oPolygon)
+    {
+        Rings& oRings = moResult.polygons.emplace_back();
+        for (const json& oRing : List(oPolygon))
+        {
+            Ring& oVertices = oRings.emplace_back();
+            for (const json& oPosition : List(oRing))
+            {
+                if (!oPosition.is_array() || oPosition.size() < 2 || !oPosition[0].is_number() ||
+                    !oPosition[1].is_number())
+                    Fail("a position is not of the form [x, y]");
+                oVertices.push_back({oPosition[0].get<double>(), oPosition[1].get<double>()});
+            }
+        }
+    }
+
+    // An older form of the standard let files name a system.
+    void ReadCrs(const json& oCrs)
+    {
+        const std::string name = oCrs.value(json::json_pointer("/properties/name"), std::string());
+        const auto nEpsg = name.find("EPSG:");
+        if (name.find("CRS84") != std::string::npos)
+            moResult.crs = "EPSG:4326";
+        else if (nEpsg != std::string::npos)
+            moResult.crs = "EPSG:" + name.substr(name.find_last_of(':') + 1);
+        else
+            throw UsageError("the GeoJSON names a reference system that is not known; say which with --crs");
+    }
+
+    PolygonText& moResult;
+};
+
+void ReadGeoJson(const std::string& text, PolygonText& oResult)
+{
+    oResult.geoJson = true;
+    try
+    {
+        GeoJsonReader(oResult).Read(json::parse(text));
+    }
+    catch (const json::exception& oError)
+    {
+        throw UsageError(std::string("the GeoJSON is not valid: ") + oError.what());
+    }
+}
+
+bool IsPolygonText(const std::string& text)
+{
+    const auto oFirst = std::find_if_not(text.begin(), text.end(), IsBlank);
+    std::string start(oFirst, text.end() - oFirst > 5 ? oFirst + 5 : text.end());
+    std::transform(start.begin(), start.end(), start.begin(), [](unsigned char c) { return std::toupper(c); });
+    return start.starts_with('{') || start == "POLYG" || start == "MULTI" || start == "SRID=";
+}
+
+void Parse(const std::string& text, PolygonText& oResult)
+{
+    if (std::find_if_not(text.begin(), text.end(), IsBlank) != text.end() &&
+        text[text.find_first_not_of(" \t\r\n")] == '{')
+        ReadGeoJson(text, oResult);
+    else
+        WktParser(text).Parse(oResult);
+    if (oResult.polygons.empty())
+        throw UsageError("there is no polygon in it");
+}
+
+std::string ReadText(const std::string& name)
+{
+    const std::string why = WhyUnreadable(name);
+    std::ifstream oStream(name, std::ios::binary);
+    if (!why.empty() || !oStream)
+        throw UsageError(why.empty() ? "it cannot be read" : why);
+    std::string text((std::istreambuf_iterator<char>(oStream)), std::istreambuf_iterator<char>());
+    return text.starts_with("\xEF\xBB\xBF") ? text.substr(3) : text;
+}
+
+} // namespace
+
+PolygonText ReadPolygons(const std::string& text)
+{
+    PolygonText oResult;
+    const bool bFile = !IsPolygonText(text);
+    try
+    {
+        Parse(bFile ? ReadText(text) : text, oResult);
+    }
+    catch (const UsageError& oError)
+    {
+        throw UsageError("--polygon: " + (bFile ? text + ": " : std::string()) + oError.what());
+    }
+    return oResult;
+}
+
+} // namespace krv::tool

@@ -1,0 +1,143 @@
+#include "toolkit/exceptions/exceptions.h"
+#include "tools/krv/errors.h"
+#include "tools/krv/jsontext.h"
+#include "tools/krv/masking.h"
+#include "tools/krv/verbs/verbs.h"
+
+#include <CLI/CLI.hpp>
+#include <fmt/format.h>
+
+#include <charconv>
+#include <filesystem>
+#include <map>
+#include <memory>
+
+namespace krv::tool
+{
+
+namespace
+{
+
+struct Options
+{
+    MaskRequest request;
+    std::string coordinates;
+    std::string bitmaps;
+    std::string channels;
+    std::string rule;
+    std::string write;
+    bool json = false;
+};
+
+// "new" as 0.
+unsigned int ParseTarget(const std::string& text)
+{
+    if (text == "new")
+        return 0;
+    unsigned int nBitmap = 0;
+    const auto [pEnd, eError] = std::from_chars(text.data(), text.data() + text.size(), nBitmap);
+    if (eError != std::errc() || pEnd != text.data() + text.size() || nBitmap == 0)
+        throw UsageError("--write: \"" + text + "\" is neither the number of a bitmap nor the word new");
+    return nBitmap;
+}
+
+void Settle(Options& oOptions)
+{
+    MaskRequest& oRequest = oOptions.request;
+    oRequest.bitmaps = ParseNumbers(oOptions.bitmaps, "--bitmap");
+    oRequest.channels = ParseNumbers(oOptions.channels, "--channels");
+    oRequest.rule = oOptions.rule == "all" ? krv::gobs::eAllChannels : krv::gobs::eAnyChannel;
+    if (!oRequest.polygons.empty() + !oRequest.bitmaps.empty() + oRequest.noData != 1)
+        throw UsageError("mask: say what it is made of: --polygon, --bitmap or --no-data, one of them");
+    const bool bPlaced = !oOptions.coordinates.empty() || !oRequest.crs.empty();
+    if (bPlaced && oRequest.polygons.empty())
+        throw UsageError("mask: --coordinates and --crs belong to --polygon");
+    if ((!oRequest.channels.empty() || !oOptions.rule.empty()) && !oRequest.noData)
+        throw UsageError("mask: --channels and --rule belong to --no-data");
+    if (!oOptions.coordinates.empty())
+        oRequest.coordinates = oOptions.coordinates == "pixel" ? PolygonCoordinates::ePixels : PolygonCoordinates::eMap;
+    if (!oRequest.crs.empty())
+    {
+        if (oRequest.coordinates == PolygonCoordinates::ePixels)
+            throw UsageError("mask: pixels have no reference system; leave out --crs or --coordinates pixel");
+        oRequest.coordinates = PolygonCoordinates::eNamedMap;
+    }
+    if (!oOptions.write.empty())
+        oRequest.target = ParseTarget(oOptions.write);
+}
+
+int RunMask(const std::string& file, Options& oOptions)
+{
+    Settle(oOptions);
+    MaskRequest& oRequest = oOptions.request;
+    std::error_code oNone;
+    if (!oRequest.picture.empty() && std::filesystem::equivalent(file, oRequest.picture, oNone))
+        throw krv::DataException(oRequest.picture + " is the file itself; name another for the picture");
+    const MaskResult oResult = MakeMask(file, oRequest);
+    const char* const pSource = oRequest.noData ? "no-data" : oRequest.bitmaps.empty() ? "polygons" : "bitmaps";
+    if (oOptions.json)
+    {
+        Print(ToText({{"file", file},
+                      {"source", pSource},
+                      {"set", oResult.set},
+                      {"pixels", oResult.pixels},
+                      {"bitmap", oResult.bitmap != 0 ? Json(oResult.bitmap) : Json()},
+                      {"complement", oResult.complement},
+                      {"picture", TextOrNull(oRequest.picture)}}));
+        return 0;
+    }
+    std::string text = fmt::format("{} of {} pixels set ({})\n", oResult.set, oResult.pixels, pSource);
+    if (oResult.bitmap != 0)
+        text += fmt::format("written to bitmap {}{}\n", oResult.bitmap,
+                            oResult.complement ? " as the complement: there a set bit is a valid pixel" : "");
+    if (!oRequest.picture.empty())
+        text += fmt::format("drawn to {}: set pixels are white\n", oRequest.picture);
+    Print(text);
+    return 0;
+}
+
+} // namespace
+
+void AddMaskVerb(CLI::App& oApp, Selection& oSelection)
+{
+    auto* const poVerb =
+        oApp.add_subcommand("mask", "A mask from polygons, bitmaps or no-data values: counts, stores and draws it");
+    const auto poOptions = std::make_shared<Options>();
+    poVerb->add_option("FILE", oSelection.file, "The file")->required();
+    poVerb
+        ->add_option("--polygon", poOptions->request.polygons,
+                     "Pixels inside: WKT or GeoJSON, the text itself or a file; may be repeated")
+        ->expected(1)
+        ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
+    poVerb
+        ->add_option("--coordinates", poOptions->coordinates,
+                     "Of the polygons: pixel ((0, 0) is the outer corner of the first) or map (the file's own system, "
+                     "the rule for WKT; GeoJSON is longitude, latitude otherwise)")
+        ->check(CLI::IsMember({"pixel", "map"}));
+    poVerb->add_option("--crs", poOptions->request.crs,
+                       "Reference system of the polygons, such as EPSG:4326; x is always the easting or longitude");
+    poVerb->add_option("--bitmap", poOptions->bitmaps, "Pixels set in one of these bitmaps, such as 1,3");
+    poVerb->add_flag("--no-data", poOptions->request.noData, "Pixels that equal the recorded no-data values");
+    poVerb
+        ->add_option("--rule", poOptions->rule,
+                     "Whether any of the channels with a no-data value (the default) or all of them must equal theirs")
+        ->check(CLI::IsMember({"any", "all"}));
+    poVerb->add_option("--channels", poOptions->channels, "No-data of these channels only, such as 1,3");
+    poVerb->add_option("--write", poOptions->write,
+                       "Store it in this bitmap of the file, or in a new one (the word new). No-data is stored as its "
+                       "complement, so that set bits are valid pixels");
+    poVerb->add_option("--png", poOptions->request.picture, "Draw it, set pixels white; the file is replaced");
+    poVerb->add_option("--size", poOptions->request.pictureSize, "Longest side of the picture in pixels (1024)")
+        ->check(CLI::Range(1, 16384));
+    poVerb->add_flag("--json", poOptions->json, "As JSON");
+    poVerb->callback(
+        [&oSelection, poOptions]
+        {
+            oSelection.run = [&oSelection, poOptions]
+            {
+                return RunMask(oSelection.file, *poOptions);
+            };
+        });
+}
+
+} // namespace krv::tool
