@@ -1,0 +1,271 @@
+// krv mask on copies of real files and on files made here.
+
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "datasources/reader/basicreader.h"
+#include "gobs/raster/raster.h"
+#include "tests/support/demofile.h"
+#include "tests/support/recipe.h"
+#include "tests/support/tempfolder.h"
+#include "tests/tools/programrun.h"
+#include "toolkit/ogc/cs/coordinatetransformation.h"
+#include "toolkit/ogc/cs/crsfactory.h"
+#include "toolkit/ogc/cs/geocodinginfo.h"
+
+#include <gtest/gtest.h>
+#include <png.h>
+
+#include <algorithm>
+#include <cstdlib>
+#include <filesystem>
+#include <memory>
+
+namespace krv::tool
+{
+
+namespace
+{
+
+using krv::datasources::BasicReader;
+using krv::datasources::IDataset;
+using krv::test::ProgramRun;
+using krv::test::RunKrv;
+using krv::test::TempFolder;
+using nlohmann::json;
+
+constexpr unsigned int WIDTH = 791;
+constexpr unsigned int HEIGHT = 718;
+
+// A copy of a georeferenced image of 791 x 718 pixels, 3 x 8U, no-data 0.
+class MaskCommand : public testing::Test
+{
+protected:
+    void SetUp() override
+    {
+        const char* const pFolder = std::getenv("KRV_TEST_DATA");
+        const std::string source =
+            std::string(pFolder != nullptr ? pFolder : KRV_TEST_DATA) + "/optical/rgb_deflate.tif";
+        if (!std::filesystem::exists(source))
+            GTEST_SKIP() << "no " << source;
+        krv::test::WriteFile(moFile, krv::test::ReadFile(source));
+    }
+
+    std::unique_ptr<IDataset> Open() const
+    {
+        return std::unique_ptr<IDataset>(krv::datasources::DatasetManager::GetInstance()->Open(moFile, eReadOnly));
+    }
+
+    // All bytes of a bitmap or, for 0, of the three channels.
+    std::string Pixels(unsigned int nBitmap) const
+    {
+        const auto poDataset = Open();
+        const auto poReader =
+            nBitmap == 0
+                ? std::make_unique<BasicReader>(poDataset.get(), std::vector<unsigned int>{}, false)
+                : std::make_unique<BasicReader>(dynamic_cast<krv::datasources::IBitmapDataset*>(poDataset.get()),
+                                                std::vector<unsigned int>{nBitmap}, false);
+        const std::unique_ptr<krv::gobs::Raster> poAll(poReader->ReadRaster(0, 0, WIDTH, HEIGHT));
+        return {reinterpret_cast<const char*>(poAll->GetBuffer()), poAll->GetBufferSize()};
+    }
+
+    // A run that writes a new bitmap; returns the bitmap's pixels.
+    std::string Written(const std::vector<std::string>& oArguments)
+    {
+        std::vector<std::string> oAll{"mask", moFile, "--write", "new", "--json"};
+        oAll.insert(oAll.end(), oArguments.begin(), oArguments.end());
+        const ProgramRun oRun = RunKrv(oAll);
+        EXPECT_EQ(oRun.code, 0) << oRun.errors;
+        if (oRun.code != 0)
+            return {};
+        moReport = oRun.Json();
+        return Pixels(moReport["bitmap"]);
+    }
+
+    TempFolder moFolder;
+    std::string moFile = moFolder.File("scene.tif");
+    json moReport;
+};
+
+TEST_F(MaskCommand, PolygonsMeanTheSamePixelsInEveryReferenceSystem)
+{
+    const auto poDataset = Open();
+    const auto& oGeocoding = dynamic_cast<krv::datasources::IGeocodedDataset&>(*poDataset).GetGeocoding();
+    const std::unique_ptr<krv::ogc::cs::ICRS> poSystem(poDataset->ReadCRS());
+    const krv::ogc::cs::CoordinateTransformation oToDegrees(*poSystem, *krv::ogc::cs::CreateCRSFromEPSG(4326));
+    const krv::ogc::cs::CoordinateTransformation oToMercator(*poSystem, *krv::ogc::cs::CreateCRSFromEPSG(3857));
+    const double aRings[2][4][2] = {{{-30.3, 40.7}, {700.2, 3.1}, {640.9, 600.4}, {100.6, 801.9}},
+                                    {{200.3, 200.8}, {300.2, 210.3}, {280.1, 330.7}, {205.4, 340.2}}};
+    std::string pixels = "Polygon ((", mercator = "SRID=3857;MULTIPOLYGON Z(((";
+    std::string map = "  polygon\n zm ((";
+    json oGeoJson = json::array();
+    for (const auto& aRing : aRings)
+    {
+        json oRing = json::array();
+        for (int i = 0; i < 5; ++i)
+        {
+            const double* const pVertex = aRing[i % 4];
+            const char* const pEnd = i < 4 ? ", " : &aRing == &aRings[0] ? "), (" : ")";
+            double nX = 0, nY = 0;
+            oGeocoding.RasterToMap(pVertex[0], pVertex[1], nX, nY);
+            double nDegreesX = nX, nDegreesY = nY, nMercatorX = nX, nMercatorY = nY;
+            ASSERT_TRUE(oToDegrees.Transform(nDegreesX, nDegreesY) && oToMercator.Transform(nMercatorX, nMercatorY));
+            pixels += json(pVertex[0]).dump() + " " + json(pVertex[1]).dump() + pEnd;
+            map += json(nX).dump() + "\t" + json(nY).dump() + " 12 -7e1" + pEnd;
+            mercator += json(nMercatorX).dump() + " " + json(nMercatorY).dump() + " 0" + pEnd;
+            oRing.push_back({nDegreesX, nDegreesY});
+        }
+        oGeoJson.push_back(oRing);
+    }
+    const json oFeatures{{"type", "FeatureCollection"},
+                         {"features",
+                          {{{"type", "Feature"}, {"geometry", nullptr}},
+                           {{"type", "Feature"},
+                            {"geometry",
+                             {{"type", "GeometryCollection"},
+                              {"geometries",
+                               {{{"type", "Point"}, {"coordinates", {1, 2}}},
+                                {{"type", "MultiPolygon"}, {"coordinates", {oGeoJson}}}}}}}}}}};
+    krv::test::WriteFile(moFolder.File("zones.geojson"), oFeatures.dump());
+    const std::string expected = Written({"--polygon", pixels + ")", "--coordinates", "pixel"});
+    EXPECT_GT(moReport["set"], 200000);
+    EXPECT_EQ(moReport["set"], std::count(expected.begin(), expected.end(), '\1'));
+    EXPECT_EQ(moReport["complement"], false);
+    EXPECT_EQ(expected[300 * WIDTH + 150], '\1');
+    EXPECT_EQ(expected[270 * WIDTH + 250], '\0') << "the hole";
+    EXPECT_TRUE(Written({"--polygon", map + ")"}) == expected);
+    EXPECT_TRUE(Written({"--polygon", mercator + "))"}) == expected);
+    EXPECT_TRUE(Written({"--polygon", moFolder.File("zones.geojson")}) == expected);
+    EXPECT_TRUE(Written({"--polygon", oFeatures.dump(), "--crs", "EPSG:4326"}) == expected);
+    EXPECT_TRUE(Written({"--bitmap", "2,1"}) == expected);
+    // In two parts that overlap.
+    Written({"--polygon", "POLYGON((0 0,20 0,20 10,0 10))", "--polygon",
+             R"({"type":"Polygon","coordinates":[[[10,0],[30,0],[30,10],[10,10]]]})", "--coordinates", "pixel"});
+    EXPECT_EQ(moReport["set"], 300);
+}
+
+TEST_F(MaskCommand, NoDataIsStoredAsItsComplement)
+{
+    const std::string pixels = Pixels(0);
+    std::string any, all;
+    for (std::size_t i = 0; i < pixels.size(); i += 3)
+    {
+        const auto nZeros = std::count(pixels.begin() + static_cast<std::ptrdiff_t>(i),
+                                       pixels.begin() + static_cast<std::ptrdiff_t>(i) + 3, '\0');
+        any += nZeros == 0 ? '\1' : '\0';
+        all += nZeros != 3 ? '\1' : '\0';
+    }
+    ASSERT_NE(any, all);
+    EXPECT_TRUE(Written({"--no-data"}) == any);
+    EXPECT_EQ(moReport["complement"], true);
+    EXPECT_EQ(moReport["set"], std::count(any.begin(), any.end(), '\0'));
+    EXPECT_TRUE(Written({"--no-data", "--rule", "all"}) == all);
+    const ProgramRun oRun = RunKrv({"mask", moFile, "--no-data", "--write", "1"});
+    EXPECT_NE(oRun.output.find("complement"), std::string::npos) << oRun.output;
+
+    // Channels of several types, each with the value in its own type.
+    const std::string mixed = moFolder.File("mixed.demo");
+    const std::vector<krv::gobs::DataType> oTypes{krv::gobs::eDT_8U, krv::gobs::eDT_16U, krv::gobs::eDT_8U};
+    const std::string first = krv::test::RecipeImage(40, 30, {1}, oTypes[0]);
+    const int nValue = static_cast<unsigned char>(first[77]);
+    krv::datasources::MetadataMap oTags;
+    oTags["NO_DATA_VALUE"] = std::to_string(nValue);
+    krv::test::WriteDemoFile(mixed, 40, 30, oTypes, oTags);
+    const std::string second = krv::test::RecipeImage(40, 30, {2}, oTypes[1]);
+    const std::string third = krv::test::RecipeImage(40, 30, {3}, oTypes[2]);
+    int nAny = 0, nAll = 0;
+    for (std::size_t i = 0; i < first.size(); ++i)
+    {
+        const bool a = static_cast<unsigned char>(first[i]) == nValue,
+                   c = static_cast<unsigned char>(third[i]) == nValue;
+        const bool b = static_cast<unsigned char>(second[2 * i]) == nValue && second[2 * i + 1] == 0;
+        nAny += a || b || c ? 1 : 0;
+        nAll += a && b && c ? 1 : 0;
+    }
+    EXPECT_GT(nAny, 0);
+    EXPECT_EQ(RunKrv({"mask", mixed, "--no-data", "--json"}).Json()["set"], nAny);
+    EXPECT_EQ(RunKrv({"mask", mixed, "--no-data", "--rule", "all", "--json"}).Json()["set"], nAll);
+}
+
+TEST_F(MaskCommand, DrawsTheShareOfSetPixels)
+{
+    const std::string picture = moFolder.File("mask.png");
+    ASSERT_EQ(RunKrv({"mask", moFile, "--polygon", "POLYGON((0 0, 500 0, 500 718, 0 718))", "--coordinates", "pixel",
+                      "--png", picture, "--size", "100"})
+                  .code,
+              0);
+    png_image oImage{};
+    oImage.version = PNG_IMAGE_VERSION;
+    ASSERT_NE(png_image_begin_read_from_file(&oImage, picture.c_str()), 0);
+    EXPECT_EQ(oImage.width, 100u);
+    EXPECT_EQ(oImage.height, 91u);
+    oImage.format = PNG_FORMAT_GRAY;
+    std::string grey(PNG_IMAGE_SIZE(oImage), '\0');
+    ASSERT_NE(png_image_finish_read(&oImage, nullptr, grey.data(), 0, nullptr), 0);
+    const auto At = [&grey](unsigned int x, unsigned int y)
+    {
+        return static_cast<unsigned char>(grey[y * 100 + x]);
+    };
+    EXPECT_EQ(At(0, 0), 255);
+    EXPECT_EQ(At(62, 90), 255);
+    // Columns 499 to 506 of the image make column 63: one of eight is set.
+    EXPECT_EQ(At(63, 45), 32);
+    EXPECT_EQ(At(64, 45), 0);
+}
+
+TEST_F(MaskCommand, FailuresSayWhyOnOneLineAndChangeNothing)
+{
+    const std::string demo = moFolder.File("plain.demo"), picture = moFolder.GetPath() + "/none/mask.png";
+    krv::test::WriteDemoFile(demo, 8, 8, {krv::gobs::eDT_8U});
+    const std::string before = krv::test::ReadFile(moFile);
+    const std::string square = "POLYGON((0 0,5 0,5 5,0 5))";
+    struct Case
+    {
+        std::vector<std::string> arguments;
+        int code;
+        std::string words;
+    };
+    const std::vector<Case> oCases{
+        {{moFile}, 2, "--polygon, --bitmap or --no-data"},
+        {{moFile, "--bitmap", "1", "--no-data"}, 2, "one of them"},
+        {{moFile, "--bitmap", "7", "--write", "new"}, 2, "there is no bitmap 7; there are none"},
+        {{moFile, "--no-data", "--write", "4"}, 2, "there is no bitmap 4"},
+        {{moFile, "--no-data", "--write", "-1"}, 2, "--write"},
+        {{moFile, "--no-data", "--channels", "4"}, 2, "channel 4"},
+        {{moFile, "--no-data", "--coordinates", "pixel"}, 2, "--polygon"},
+        {{moFile, "--polygon", square, "--crs", "EPSG:4326", "--coordinates", "pixel"}, 2, "--crs"},
+        {{moFile, "--polygon", square, "--crs", "nonsense", "--write", "new"}, 1, "nonsense"},
+        {{moFile, "--polygon", "POLYGON((0 0,5 0"}, 2, "character 17"},
+        {{moFile, "--polygon", "POLYGON((0 0,nan 0,4 4))"}, 2, "a number is expected"},
+        {{moFile, "--polygon", "POLYGON((0 0,1e400 0,4 4))"}, 2, "a number is expected"},
+        {{moFile, "--polygon", "POLYGON EMPTY"}, 2, "no polygon"},
+        {{moFile, "--polygon", "POINT(1 2)"}, 2, "no such file"},
+        {{moFile, "--polygon", moFolder.GetPath()}, 2, "folder"},
+        {{moFile, "--polygon", moFile}, 2, "scene.tif"},
+        {{moFile, "--polygon", R"({"type":"Polygon","coordinates":[[[1],[2,3]]]})"}, 2, "[x, y]"},
+        {{moFile, "--polygon", R"({"type":"Polygon"})"}, 2, "coordinates"},
+        {{moFile, "--polygon", R"({"type":"Polygon",)"}, 2, "GeoJSON"},
+        {{moFile, "--polygon", R"({"type":"Polygon","coordinates":[[[0,1e999],[1,2]]]})"}, 2, "GeoJSON"},
+        {{moFile, "--polygon", R"({"type":"Polygon","coordinates":[[[0,95],[1,2],[3,4]]]})"}, 1, "0 95"},
+        {{demo, "--polygon", square}, 1, "not georeferenced"},
+        {{demo, "--polygon", square, "--coordinates", "pixel", "--write", "new"}, 1, "plain.demo"},
+        {{demo, "--no-data"}, 1, "no no-data value"},
+        {{moFile, "--no-data", "--png", moFile}, 1, "the file itself"},
+        {{moFile, "--no-data", "--write", "new", "--png", picture}, 1, "mask.png"}};
+    for (const Case& oCase : oCases)
+    {
+        std::vector<std::string> oArguments{"mask"};
+        oArguments.insert(oArguments.end(), oCase.arguments.begin(), oCase.arguments.end());
+        const ProgramRun oRun = RunKrv(oArguments);
+        EXPECT_EQ(oRun.code, oCase.code) << oCase.words << ": " << oRun.errors;
+        EXPECT_NE(oRun.errors.find(oCase.words), std::string::npos) << oCase.words << " is not in " << oRun.errors;
+        EXPECT_EQ(std::count(oRun.errors.begin(), oRun.errors.end(), '\n'), 1) << oRun.errors;
+        EXPECT_TRUE(oRun.output.empty());
+        ASSERT_TRUE(krv::test::ReadFile(moFile) == before) << oCase.words;
+    }
+}
+
+} // namespace
+
+} // namespace krv::tool
