@@ -42,22 +42,20 @@ unsigned int StackedIO::GetTileHeight() const
     return moParts.front()->GetTileHeight();
 }
 
-// Each part reads a window of its own that is just the part of the caller's that lies in the image, since what lies
-// outside has to stay as it is.
-void StackedIO::ReadWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
-                           unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
-                           unsigned char* pBuffer)
+// What of the caller's part lies in the image is taken in slices: each channel as a window of just that slice, since
+// what lies outside has to stay as it is.
+template <typename Action>
+void StackedIO::ForEachSlice(int nX, int nY, unsigned int nWidth, unsigned int nHeight, const PixelRect& oPart,
+                             const unsigned char* pBuffer, Action oAction)
 {
-    if (moParts.size() == 1)
-        return moParts.front()->ReadWindow(nX, nY, nWidth, nHeight, nPartX, nPartY, nPartWidth, nPartHeight, pBuffer);
     if (pBuffer == nullptr)
         throw DataException("The buffer is NULL");
-    if (std::uint64_t{nPartX} + nPartWidth > nWidth || std::uint64_t{nPartY} + nPartHeight > nHeight)
+    if (std::uint64_t{oPart.mnX} + oPart.mnWidth > nWidth || std::uint64_t{oPart.mnY} + oPart.mnHeight > nHeight)
         throw DataException("The part is not inside its window");
-    const std::int64_t nLeft = std::max<std::int64_t>(0, std::int64_t{nX} + nPartX);
-    const std::int64_t nTop = std::max<std::int64_t>(0, std::int64_t{nY} + nPartY);
-    const std::int64_t nRight = std::min<std::int64_t>(GetFileWidth(), std::int64_t{nX} + nPartX + nPartWidth);
-    const std::int64_t nBottom = std::min<std::int64_t>(GetFileHeight(), std::int64_t{nY} + nPartY + nPartHeight);
+    const std::int64_t nLeft = std::max<std::int64_t>(0, std::int64_t{nX} + oPart.mnX);
+    const std::int64_t nTop = std::max<std::int64_t>(0, std::int64_t{nY} + oPart.mnY);
+    const std::int64_t nRight = std::min<std::int64_t>(GetFileWidth(), std::int64_t{nX} + oPart.mnX + oPart.mnWidth);
+    const std::int64_t nBottom = std::min<std::int64_t>(GetFileHeight(), std::int64_t{nY} + oPart.mnY + oPart.mnHeight);
     if (nLeft >= nRight || nTop >= nBottom)
         return;
     const auto nCutWidth = static_cast<unsigned int>(nRight - nLeft);
@@ -67,38 +65,64 @@ void StackedIO::ReadWindow(int nX, int nY, unsigned int nWidth, unsigned int nHe
     for (std::int64_t nRow = nTop; nRow < nBottom; nRow += nSlice)
     {
         const auto nRows = static_cast<unsigned int>(std::min(nSlice, nBottom - nRow));
-        unsigned char* pPlane = moScratch.Get(nPlanePitch * nRows);
-        unsigned char* pTarget = pBuffer + static_cast<std::size_t>(nRow - nY) * nPitch +
-                                 static_cast<std::size_t>(nLeft - nX) * mnValueBytes * moParts.size();
+        const std::size_t nBegin = static_cast<std::size_t>(nRow - nY) * nPitch +
+                                   static_cast<std::size_t>(nLeft - nX) * mnValueBytes * moParts.size();
         for (std::size_t nAt = 0; nAt < moParts.size(); ++nAt)
-        {
-            moParts[nAt]->ReadWindow(static_cast<unsigned int>(nLeft), static_cast<unsigned int>(nRow), nCutWidth,
-                                     nRows, pPlane);
-            codec::PlaceChannel(pPlane, nPlanePitch, pTarget, nPitch, nAt, moParts.size(),
-                                {nCutWidth, nRows, mnValueBytes});
-        }
+            oAction(nAt, PixelRect{static_cast<unsigned int>(nLeft), static_cast<unsigned int>(nRow), nCutWidth, nRows},
+                    moScratch.Get(nPlanePitch * nRows), nPlanePitch, nBegin, nPitch);
     }
+}
+
+void StackedIO::CheckInside(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight) const
+{
+    if (std::uint64_t{nX} + nWidth > GetFileWidth() || std::uint64_t{nY} + nHeight > GetFileHeight())
+        throw DataException("The window is not inside the image");
+}
+
+void StackedIO::ReadWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
+                           unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
+                           unsigned char* pBuffer)
+{
+    if (moParts.size() == 1)
+        return moParts.front()->ReadWindow(nX, nY, nWidth, nHeight, nPartX, nPartY, nPartWidth, nPartHeight, pBuffer);
+    ForEachSlice(nX, nY, nWidth, nHeight, {nPartX, nPartY, nPartWidth, nPartHeight}, pBuffer,
+                 [&](std::size_t nAt, const PixelRect& oRect, unsigned char* pPlane, std::size_t nPlanePitch,
+                     std::size_t nBegin, std::size_t nPitch)
+                 {
+                     moParts[nAt]->ReadWindow(oRect.mnX, oRect.mnY, oRect.mnWidth, oRect.mnHeight, pPlane);
+                     codec::PlaceChannel(pPlane, nPlanePitch, pBuffer + nBegin, nPitch, nAt, moParts.size(),
+                                         {oRect.mnWidth, oRect.mnHeight, mnValueBytes});
+                 });
 }
 
 void StackedIO::ReadWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
                            unsigned char* pBuffer)
 {
-    if (moParts.size() == 1)
-        return moParts.front()->ReadWindow(nX, nY, nWidth, nHeight, pBuffer);
-    if (std::uint64_t{nX} + nWidth > GetFileWidth() || std::uint64_t{nY} + nHeight > GetFileHeight())
-        throw DataException("The window is not inside the image");
+    CheckInside(nX, nY, nWidth, nHeight);
     ReadWindow(static_cast<int>(nX), static_cast<int>(nY), nWidth, nHeight, 0, 0, nWidth, nHeight, pBuffer);
 }
 
-void StackedIO::WriteWindow(int, int, unsigned int, unsigned int, unsigned int, unsigned int, unsigned int,
-                            unsigned int, unsigned char* const)
+void StackedIO::WriteWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
+                            unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
+                            unsigned char* const pBuffer)
 {
-    throw DataException("Bitmaps cannot be written");
+    if (moParts.size() == 1)
+        return moParts.front()->WriteWindow(nX, nY, nWidth, nHeight, nPartX, nPartY, nPartWidth, nPartHeight, pBuffer);
+    ForEachSlice(nX, nY, nWidth, nHeight, {nPartX, nPartY, nPartWidth, nPartHeight}, pBuffer,
+                 [&](std::size_t nAt, const PixelRect& oRect, unsigned char* pPlane, std::size_t nPlanePitch,
+                     std::size_t nBegin, std::size_t nPitch)
+                 {
+                     codec::ExtractChannel(pBuffer + nBegin, nPitch, nAt, moParts.size(), pPlane, nPlanePitch,
+                                           {oRect.mnWidth, oRect.mnHeight, mnValueBytes});
+                     moParts[nAt]->WriteWindow(oRect.mnX, oRect.mnY, oRect.mnWidth, oRect.mnHeight, pPlane);
+                 });
 }
 
-void StackedIO::WriteWindow(unsigned int, unsigned int, unsigned int, unsigned int, unsigned char* const)
+void StackedIO::WriteWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
+                            unsigned char* const pBuffer)
 {
-    throw DataException("Bitmaps cannot be written");
+    CheckInside(nX, nY, nWidth, nHeight);
+    WriteWindow(static_cast<int>(nX), static_cast<int>(nY), nWidth, nHeight, 0, 0, nWidth, nHeight, pBuffer);
 }
 
 } // namespace krv::plugins::support

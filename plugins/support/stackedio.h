@@ -1,6 +1,7 @@
 #pragma once
 
 #include "datasources/interfaces/ioverviewio.h"
+#include "plugins/support/imagelayout.h"
 #include "plugins/support/scratch.h"
 
 #include <memory>
@@ -9,7 +10,7 @@
 namespace krv::plugins::support
 {
 
-// Several one-channel I/O objects of the same image size and type, read as the channels of one. Writing is refused.
+// Several one-channel I/O objects of the same image size and type, read and written as the channels of one.
 class StackedIO : public krv::datasources::IOverviewIO
 {
 public:
@@ -36,6 +37,11 @@ public:
                      unsigned char* const pBuffer) override;
 
 private:
+    template <typename Action>
+    void ForEachSlice(int nX, int nY, unsigned int nWidth, unsigned int nHeight, const PixelRect& oPart,
+                      const unsigned char* pBuffer, Action oAction);
+    void CheckInside(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight) const;
+
     std::vector<std::unique_ptr<krv::datasources::IRasterIO>> moParts;
     unsigned int mnValueBytes;
     unsigned int mnLevel;

@@ -1,0 +1,364 @@
+// The rarer ways of writing: files of other programs, colour tables, lossy pixels, limits, several bitmaps at once.
+
+#include "datasources/interfaces/ioverviewmanager.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/metadata/auxiliarydata.h"
+#include "gobs/pct/pct.h"
+#include "gobs/raster/rasterinfo.h"
+#include "tests/plugins/tifwriting/writingsupport.h"
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/ogc/cs/geocodinginfo.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <tiffio.h>
+
+#include <algorithm>
+#include <cstring>
+#include <filesystem>
+
+namespace
+{
+
+using namespace krv::test;
+using krv::datasources::AuxiliaryData;
+
+// A file as libtiff writes it: 50 x 40 pixels in tiles or strips of 16 rows.
+struct ForeignFile
+{
+    const char* mpMode;
+    std::uint16_t mnChannels;
+    std::uint16_t mnBits;
+    std::uint16_t mnCompression;
+    std::uint16_t mnPredictor;
+    bool mbTiled;
+    bool mbSeparate;
+};
+
+constexpr std::uint32_t WIDTH = 50;
+constexpr std::uint32_t HEIGHT = 40;
+
+void SetForm(TIFF* poTiff, const ForeignFile& oForm, std::uint32_t nWidth, std::uint32_t nHeight)
+{
+    TIFFSetField(poTiff, TIFFTAG_IMAGEWIDTH, nWidth);
+    TIFFSetField(poTiff, TIFFTAG_IMAGELENGTH, nHeight);
+    TIFFSetField(poTiff, TIFFTAG_SAMPLESPERPIXEL, oForm.mnChannels);
+    TIFFSetField(poTiff, TIFFTAG_BITSPERSAMPLE, oForm.mnBits);
+    TIFFSetField(poTiff, TIFFTAG_COMPRESSION, oForm.mnCompression);
+    TIFFSetField(poTiff, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
+    TIFFSetField(poTiff, TIFFTAG_PLANARCONFIG, oForm.mbSeparate ? PLANARCONFIG_SEPARATE : PLANARCONFIG_CONTIG);
+    if (oForm.mnPredictor != 1)
+        TIFFSetField(poTiff, TIFFTAG_PREDICTOR, oForm.mnPredictor);
+    if (oForm.mbTiled)
+    {
+        TIFFSetField(poTiff, TIFFTAG_TILEWIDTH, 16);
+        TIFFSetField(poTiff, TIFFTAG_TILELENGTH, 16);
+    }
+    else
+        TIFFSetField(poTiff, TIFFTAG_ROWSPERSTRIP, 16);
+}
+
+// Blocks whose stored bytes count upwards.
+void WriteBlocks(TIFF* poTiff, bool bTiled)
+{
+    Bytes oBlock(static_cast<std::size_t>(bTiled ? TIFFTileSize(poTiff) : TIFFStripSize(poTiff)));
+    const std::uint32_t nBlocks = bTiled ? TIFFNumberOfTiles(poTiff) : TIFFNumberOfStrips(poTiff);
+    for (std::uint32_t nBlock = 0; nBlock < nBlocks; ++nBlock)
+    {
+        for (std::size_t nAt = 0; nAt < oBlock.size(); ++nAt)
+            oBlock[nAt] = static_cast<unsigned char>(nAt + 7 * nBlock);
+        if (bTiled)
+            TIFFWriteEncodedTile(poTiff, nBlock, oBlock.data(), static_cast<tmsize_t>(oBlock.size()));
+        else
+            TIFFWriteEncodedStrip(poTiff, nBlock, oBlock.data(), static_cast<tmsize_t>(oBlock.size()));
+    }
+}
+
+TEST(TifPaths, FilesOfOtherProgramsAreUpdatedInTheirOwnForm)
+{
+    constexpr ForeignFile FILES[] = {
+        {"wb", 3, 16, COMPRESSION_NONE, 1, true, false},           {"wb", 2, 16, COMPRESSION_LZW, 2, false, false},
+        {"wb8", 1, 32, COMPRESSION_ADOBE_DEFLATE, 2, true, false}, {"wb", 3, 16, COMPRESSION_PACKBITS, 1, false, true},
+        {"wl", 1, 4, COMPRESSION_NONE, 1, false, false},           {"wb", 3, 2, COMPRESSION_LZW, 1, true, false},
+        {"wl", 1, 12, COMPRESSION_ADOBE_DEFLATE, 1, false, false}, {"wl", 2, 1, COMPRESSION_PACKBITS, 1, false, true}};
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("foreign.tif");
+    for (const ForeignFile& oForm : FILES)
+    {
+        SCOPED_TRACE(std::string(oForm.mpMode) + " " + std::to_string(oForm.mnBits) + " bits, compression " +
+                     std::to_string(oForm.mnCompression));
+        TIFF* const poTiff = TIFFOpen(fileName.c_str(), oForm.mpMode);
+        SetForm(poTiff, oForm, WIDTH, HEIGHT);
+        WriteBlocks(poTiff, oForm.mbTiled);
+        TIFFClose(poTiff);
+
+        TifPointer poDataset = OpenTif(fileName, eUpdate);
+        Bytes oExpected = ReadAll(*poDataset);
+        const std::size_t nPixel = PixelBytes(*poDataset), nValue = nPixel / oForm.mnChannels;
+        const unsigned int nMask = oForm.mnBits >= 8 ? 255U : (1U << oForm.mnBits) - 1;
+        constexpr unsigned int X = 9, Y = 11, W = 30, H = 20;
+        Bytes oWindow(W * H * nPixel, 0);
+        for (std::size_t nAt = 0; nAt < oWindow.size(); nAt += nValue)
+            oWindow[nAt] = static_cast<unsigned char>((nAt / nValue * 5 + 1) & nMask);
+        for (unsigned int nRow = 0; nRow < H; ++nRow)
+            std::memcpy(&oExpected[((Y + nRow) * WIDTH + X) * nPixel], &oWindow[nRow * W * nPixel], W * nPixel);
+        {
+            const std::unique_ptr<krv::datasources::IRasterIO> poIO(
+                poDataset->GetRasterIO(AllChannels(oForm.mnChannels)));
+            poIO->WriteWindow(X, Y, W, H, oWindow.data());
+        }
+        EXPECT_TRUE(ReadAll(*poDataset) == oExpected);
+        poDataset->Close();
+        EXPECT_TRUE(ReadAll(*OpenTif(fileName)) == oExpected);
+        const Judgement oJudgement = Judge(fileName);
+        EXPECT_EQ(oJudgement.moComplaints, "");
+        EXPECT_EQ(oJudgement.mnCompression, oForm.mnCompression);
+        EXPECT_EQ(ReadFile(fileName).substr(0, 2), oForm.mpMode[1] == 'b' ? "MM" : "II");
+        if (oForm.mnBits % 8 == 0)
+        {
+            EXPECT_TRUE(oJudgement.moPixels == oExpected);
+        }
+    }
+}
+
+TEST(TifPaths, PagesBelowTheFirstAndTagsThatNobodyAskedAboutStay)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("below.tif");
+    constexpr ForeignFile FORM{"w", 1, 8, COMPRESSION_LZW, 1, true, false};
+    constexpr std::uint32_t MADE_UP = 65001;
+    const TIFFFieldInfo oField = {MADE_UP, -1, -1, TIFF_DOUBLE, FIELD_CUSTOM, 1, 1, const_cast<char*>("MadeUp")};
+    double aValues[92];
+    for (int n = 0; n < 92; ++n)
+        aValues[n] = n * 0.1;
+    TIFF* const poTiff = TIFFOpen(fileName.c_str(), FORM.mpMode);
+    TIFFMergeFieldInfo(poTiff, &oField, 1);
+    SetForm(poTiff, FORM, WIDTH, HEIGHT);
+    toff_t aBelow[1] = {0};
+    TIFFSetField(poTiff, TIFFTAG_SUBIFD, 1, aBelow);
+    TIFFSetField(poTiff, MADE_UP, 92, aValues);
+    WriteBlocks(poTiff, true);
+    TIFFWriteDirectory(poTiff);
+    SetForm(poTiff, FORM, WIDTH / 2, HEIGHT / 2);
+    TIFFSetField(poTiff, TIFFTAG_SUBFILETYPE, FILETYPE_REDUCEDIMAGE);
+    WriteBlocks(poTiff, true);
+    TIFFClose(poTiff);
+
+    TifPointer poDataset = OpenTif(fileName, eUpdate);
+    std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poDataset->GetOverviewManager());
+    ASSERT_EQ(poLevels->GetLevels(), std::vector<unsigned int>{2});
+    const Bytes oPixels(WIDTH * HEIGHT, 9), oLevel(WIDTH / 2 * HEIGHT / 2, 8);
+    WriteAll(*poDataset, oPixels);
+    {
+        const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(2, {1}));
+        WriteAll(*poIO, 1, oLevel);
+    }
+    poLevels->SetValid(1, 2, true);
+    AuxiliaryData oRecord = poDataset->ReadAuxiliaryData();
+    const std::string polynomials = [&aValues]
+    {
+        std::ostringstream oText;
+        for (int n = 0; n < 92; ++n)
+            oText << (n == 0 ? "" : " ") << aValues[n];
+        return oText.str();
+    }();
+    oRecord.SetFileMetadataValue("RPC", polynomials);
+    oRecord.SetFileMetadataValue("GroundControlPoints", "1 2 10 20 0; 30 2 40 20 0; 1 30 10 60 0");
+    poDataset->WriteAuxiliaryData(oRecord);
+    poDataset->Close();
+    // Another update, of something else.
+    poDataset = OpenTif(fileName, eUpdate);
+    oRecord = poDataset->ReadAuxiliaryData();
+    EXPECT_EQ(oRecord.GetFileMetadataValue("RPC"), polynomials);
+    EXPECT_EQ(oRecord.GetFileMetadataValue("GroundControlPoints"), "1 2 10 20 0; 30 2 40 20 0; 1 30 10 60 0");
+    oRecord.SetFileMetadataValue("Note", "changed");
+    poDataset->WriteAuxiliaryData(oRecord);
+    poDataset->Close();
+    const TifPointer poRead = OpenTif(fileName);
+    EXPECT_EQ(poRead->ReadAuxiliaryData().GetFileMetadata(), oRecord.GetFileMetadata());
+    poLevels.reset(poRead->GetOverviewManager());
+    EXPECT_TRUE(poLevels->IsValid(1, 2));
+    const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(2, {1}));
+    EXPECT_TRUE(ReadAll(*poIO, 1) == oLevel);
+    EXPECT_TRUE(Judge(fileName).moPixels == oPixels);
+
+    TIFF* const poAgain = TIFFOpen(fileName.c_str(), "r");
+    TIFFMergeFieldInfo(poAgain, &oField, 1);
+    std::uint16_t nCount = 0;
+    const double* pValues = nullptr;
+    ASSERT_EQ(TIFFSetDirectory(poAgain, 0), 1);
+    ASSERT_EQ(TIFFGetField(poAgain, MADE_UP, &nCount, &pValues), 1);
+    EXPECT_TRUE(nCount == 92 && std::equal(pValues, pValues + 92, aValues));
+    toff_t* pBelow = nullptr;
+    ASSERT_EQ(TIFFGetField(poAgain, TIFFTAG_SUBIFD, &nCount, &pBelow), 1);
+    EXPECT_EQ(TIFFSetSubDirectory(poAgain, *pBelow), 1);
+    TIFFClose(poAgain);
+}
+
+TEST(TifPaths, ColourTablesAreStoredChangedAndDeleted)
+{
+    const TempFolder oFolder;
+    for (const auto eType : {krv::gobs::eDT_8U, krv::gobs::eDT_16U})
+    {
+        const std::string fileName = oFolder.File("table.tif");
+        std::vector<krv::gobs::RGBTuple<std::uint16_t>> oColours(eType == krv::gobs::eDT_8U ? 256 : 65536);
+        for (std::size_t n = 0; n < oColours.size(); ++n)
+            oColours[n] = {static_cast<std::uint16_t>(n * 257), static_cast<std::uint16_t>(65535 - n), 700};
+        TifPointer poDataset = CreateTif(fileName, "COMPRESS=DEFLATE", 20, 20, 1, eType);
+        EXPECT_THROW(poDataset->CreatePCT(krv::gobs::PCT(), 2), krv::DataException);
+        EXPECT_EQ(poDataset->CreatePCT(krv::gobs::PCT::FromColours(oColours), 1), 1U);
+        EXPECT_THROW(poDataset->CreatePCT(krv::gobs::PCT(), 1), krv::DataException);
+        poDataset->Close();
+        TIFF* const poTiff = TIFFOpen(fileName.c_str(), "r");
+        std::uint16_t* aParts[3] = {};
+        ASSERT_EQ(TIFFGetField(poTiff, TIFFTAG_COLORMAP, &aParts[0], &aParts[1], &aParts[2]), 1);
+        EXPECT_EQ(aParts[0][17], oColours[17].red);
+        EXPECT_EQ(aParts[1][255], oColours[255].green);
+        TIFFClose(poTiff);
+        poDataset = OpenTif(fileName, eUpdate);
+        oColours[17].blue = 60000;
+        poDataset->UpdatePCT(1, krv::gobs::PCT::FromColours(oColours));
+        poDataset->Close();
+        poDataset = OpenTif(fileName, eUpdate);
+        const std::unique_ptr<krv::gobs::PCT> poTable(poDataset->GetPCT(1));
+        ASSERT_EQ(poTable->GetEntries().size(), oColours.size());
+        EXPECT_EQ(poTable->GetEntries()[17].colour.blue, 60000);
+        poDataset->DeletePCT(1);
+        EXPECT_TRUE(poDataset->GetPCTList().empty());
+        poDataset->Close();
+        EXPECT_TRUE(OpenTif(fileName)->GetPCTList().empty());
+    }
+    EXPECT_THROW(CreateTif(oFolder.File("rgb.tif"), "", 9, 9, 3, krv::gobs::eDT_8U)->CreatePCT({}, 1),
+                 krv::DataException);
+}
+
+TEST(TifPaths, JpegIsWrittenAndUpdatedWithinItsLoss)
+{
+    const TempFolder oFolder;
+    for (const char* pOptions : {"", " TILED=NO BLOCKYSIZE=32", " INTERLEAVE=BAND", " LEVEL=95"})
+    {
+        SCOPED_TRACE(pOptions);
+        const std::string fileName = oFolder.File("lossy.tif");
+        Bytes oPixels(100 * 90 * 3);
+        for (std::size_t n = 0; n < oPixels.size(); ++n)
+            oPixels[n] = static_cast<unsigned char>(60 + n / 3 % 100 + n / 300 / 3 + n % 3 * 10);
+        TifPointer poDataset =
+            CreateTif(fileName, std::string("COMPRESS=JPEG") + pOptions, 100, 90, 3, krv::gobs::eDT_8U);
+        WriteAll(*poDataset, oPixels);
+        poDataset->Close();
+        poDataset = OpenTif(fileName, eUpdate);
+        {
+            const std::unique_ptr<krv::datasources::IRasterIO> poIO(poDataset->GetRasterIO({1, 2, 3}));
+            Bytes oWindow(20 * 20 * 3, 128);
+            poIO->WriteWindow(10u, 20u, 20u, 20u, oWindow.data());
+        }
+        for (std::size_t nRow = 20; nRow < 40; ++nRow)
+            std::memset(&oPixels[(nRow * 100 + 10) * 3], 128, 60);
+        poDataset->Close();
+        const Judgement oJudgement = Judge(fileName);
+        EXPECT_EQ(oJudgement.moComplaints, "");
+        EXPECT_EQ(oJudgement.mnCompression, COMPRESSION_JPEG);
+        const Bytes oRead = ReadAll(*OpenTif(fileName));
+        double nSum = 0;
+        for (std::size_t n = 0; n < oPixels.size(); ++n)
+            nSum += std::abs(int{oRead[n]} - int{oPixels[n]});
+        EXPECT_LT(nSum / static_cast<double>(oPixels.size()), 3.0);
+    }
+}
+
+// Levels keep their pixels for the channels that stay.
+TEST(TifPaths, ChannelsComeAndGoWithLevelsAndBitmaps)
+{
+    const TempFolder oFolder;
+    for (const char* pOptions : {"COMPRESS=ZSTD", "INTERLEAVE=BAND TILED=NO"})
+    {
+        const std::string fileName = oFolder.File("levels.tif");
+        TifPointer poDataset = CreateTif(fileName, pOptions, 40, 30, 3, krv::gobs::eDT_8U);
+        std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poDataset->GetOverviewManager());
+        poLevels->CreateLevel(2);
+        const Bytes oLevel = MakePixels(20, 15, 3, krv::gobs::eDT_8U, 5);
+        {
+            const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(2, {1, 2, 3}));
+            WriteAll(*poIO, 3, oLevel);
+        }
+        for (const unsigned int nChannel : {1U, 2U, 3U})
+            poLevels->SetValid(nChannel, 2, true);
+        const unsigned int nBitmap = poDataset->CreateBitmap();
+        poLevels.reset();
+        poDataset->DeleteChannel(1);
+        poDataset->AddNewChannel(krv::gobs::RasterInfo(40, 30, 1, krv::gobs::eDT_8U));
+        poDataset->Close();
+        const TifPointer poRead = OpenTif(fileName);
+        EXPECT_EQ(poRead->GetBitmapList(), std::vector<unsigned int>{nBitmap});
+        poLevels.reset(poRead->GetOverviewManager());
+        ASSERT_EQ(poLevels->GetLevels(), std::vector<unsigned int>{2});
+        EXPECT_TRUE(poLevels->IsValid(2, 2));
+        EXPECT_FALSE(poLevels->IsValid(3, 2)) << "nothing was made of the new channel";
+        const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(2, {2}));
+        Bytes oExpected(20 * 15);
+        for (std::size_t n = 0; n < oExpected.size(); ++n)
+            oExpected[n] = oLevel[n * 3 + 2];
+        EXPECT_TRUE(ReadAll(*poIO, 1) == oExpected);
+        EXPECT_EQ(Judge(fileName).moComplaints + Judge(fileName, 1).moComplaints, "");
+    }
+}
+
+TEST(TifPaths, SeveralBitmapsAreWrittenTogether)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("bits.tif");
+    TifPointer poDataset = CreateTif(fileName, "", 61, 43, 1, krv::gobs::eDT_8U);
+    const std::vector<unsigned int> oBitmaps = {poDataset->CreateBitmap(), poDataset->CreateBitmap(),
+                                                poDataset->CreateBitmap()};
+    Bytes oBits(61 * 43 * 2);
+    for (std::size_t n = 0; n < oBits.size(); ++n)
+        oBits[n] = n % 3 == 0 || n % 7 == 0;
+    {
+        const std::unique_ptr<krv::datasources::IRasterIO> poIO(poDataset->GetBitmapIO({oBitmaps[2], oBitmaps[0]}));
+        poIO->WriteWindow(0u, 0u, 61u, 43u, oBits.data());
+        // A part whose window begins outside the image: 3 x 2 pixels of it at (0, 1).
+        Bytes oWindow(10 * 10 * 2, 1);
+        poIO->WriteWindow(-4, -3, 10, 10, 2, 4, 5, 2, oWindow.data());
+        for (const unsigned int nRow : {1U, 2U})
+            std::fill_n(oBits.begin() + nRow * 61 * 2, 3 * 2, static_cast<unsigned char>(1));
+        EXPECT_THROW(poIO->WriteWindow(0u, 1u, 61u, 43u, oBits.data()), krv::DataException);
+    }
+    poDataset->Close();
+    const TifPointer poRead = OpenTif(fileName);
+    const std::unique_ptr<krv::datasources::IRasterIO> poIO(poRead->GetBitmapIO({oBitmaps[2], oBitmaps[0]}));
+    EXPECT_TRUE(ReadAll(*poIO, 2) == oBits);
+    const std::unique_ptr<krv::datasources::IRasterIO> poUntouched(poRead->GetBitmapIO({oBitmaps[1]}));
+    EXPECT_TRUE(ReadAll(*poUntouched, 1) == Bytes(61 * 43, 0));
+}
+
+TEST(TifPaths, AClassicFileThatIsFullAndAFileThatIsOnlyReadSaySo)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("full.tif");
+    CreateTif(fileName, "COMPRESS=DEFLATE", 300, 300, 1, krv::gobs::eDT_8U)->Close();
+    const std::string before = ReadFile(fileName);
+    const Bytes oPixels = MakePixels(300, 300, 1, krv::gobs::eDT_8U, 1);
+    const TifPointer poRead = OpenTif(fileName);
+    EXPECT_THROW(WriteAll(*poRead, oPixels), krv::DataException);
+    EXPECT_THROW(poRead->WriteAuxiliaryData(AuxiliaryData(1)), krv::DataException);
+    EXPECT_THROW(poRead->SetGeocoding(krv::ogc::cs::GeocodingInfo(1, 2, 0, 3, 0, -2)), krv::DataException);
+    EXPECT_THROW(poRead->DeleteChannel(1), krv::DataException);
+    EXPECT_THROW(poRead->CreateBitmap(), krv::DataException);
+
+    std::filesystem::resize_file(fileName, UINT32_MAX - 70000); // a hole takes no room
+    TifPointer poDataset = OpenTif(fileName, eUpdate);
+    try
+    {
+        WriteAll(*poDataset, oPixels);
+        FAIL() << "what lies behind 4 GiB was written";
+    }
+    catch (const krv::IOException& oException)
+    {
+        EXPECT_THAT(oException.GetMessage(), testing::HasSubstr("full.tif"));
+    }
+    poDataset.reset();
+    std::filesystem::resize_file(fileName, before.size());
+    EXPECT_EQ(ReadFile(fileName), before);
+}
+
+} // namespace
