@@ -14,15 +14,16 @@ namespace krv::datasources::detail
 namespace
 {
 
-// Sums of boxes, or samples of the image, and for each how many samples are in it: bytes for the image, 32-bit numbers
-// above; null without validity.
+// Sums of boxes, or samples of the image, and for each how many samples are in
+// it: bytes for the image, 32-bit numbers above; null without validity.
 struct SumRow
 {
     unsigned char* mpSums = nullptr;
     unsigned char* mpCounts = nullptr;
 };
 
-// A row of boxes as far as the image reaches: its last one may have fewer columns.
+// A row of boxes as far as the image reaches: its last one may have fewer
+// columns.
 struct BoxRow
 {
     std::size_t mnBoxes;
@@ -33,6 +34,18 @@ struct BoxRow
     std::uint64_t GetSize(std::size_t nBox) const { return mnRows * (nBox + 1 == mnBoxes ? mnLastColumns : mnColumns); }
 };
 
+// Two short rows at a time are no pattern that processors fetch ahead of by
+// themselves; of long ones each is.
+constexpr std::size_t LONGEST_FETCHED_ROW = 4096;
+constexpr std::size_t FETCHED_AHEAD = 4096;
+constexpr std::size_t FETCHED_LINE = 64;
+
+void Fetch(const unsigned char* pBytes, std::size_t nBytes)
+{
+    for (std::size_t n = 0; n < nBytes; n += FETCHED_LINE)
+        __builtin_prefetch(pBytes + n);
+}
+
 // The steps of a cascade: stage k holds sums of 2^k by 2^k pixels.
 class IAverageSteps
 {
@@ -40,12 +53,15 @@ public:
     virtual ~IAverageSteps() = default;
     // Bytes of a sum and of a count.
     virtual std::size_t GetSumBytes(unsigned int nStage) const = 0;
-    // Sums of stage nStage from two rows of nPixels pixels of the stage below; a row beyond the image is zeros.
-    virtual void Sum(unsigned int nStage, const SumRow& oFirst, const SumRow& oSecond, std::size_t nPixels,
-                     const SumRow& oSums) const = 0;
-    // Pixels of a level, and with counts the validity of their values.
-    virtual void Finish(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, unsigned char* pPixels,
-                        unsigned char* pValid) const = 0;
+    // Sums of stage nStage from two rows of nPixels pixels of the stage below; a
+    // row beyond the image is zeros. May write the means of the first boxes too,
+    // as if they were whole, to pPixels unless that is null; gives their number.
+    virtual std::size_t Sum(unsigned int nStage, const SumRow& oFirst, const SumRow& oSecond, std::size_t nPixels,
+                            const SumRow& oSums, unsigned char* pPixels) const = 0;
+    // Pixels of a level from box nFirst on, and with counts the validity of their
+    // values.
+    virtual void Finish(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, std::size_t nFirst,
+                        unsigned char* pPixels, unsigned char* pValid) const = 0;
 };
 
 template <typename T>
@@ -59,8 +75,8 @@ public:
 
     std::size_t GetSumBytes(unsigned int nStage) const override { return nStage == 0 ? sizeof(T) : sizeof(SumOf<T>); }
 
-    void Sum(unsigned int nStage, const SumRow& oFirst, const SumRow& oSecond, std::size_t nPixels,
-             const SumRow& oSums) const override
+    std::size_t Sum(unsigned int nStage, const SumRow& oFirst, const SumRow& oSecond, std::size_t nPixels,
+                    const SumRow& oSums, unsigned char*) const override
     {
         if (nStage > 1)
             Add<SumOf<T>, std::uint32_t>(oFirst, oSecond, nPixels, oSums);
@@ -69,14 +85,15 @@ public:
                                   oSums);
         else
             Add<T, unsigned char>(oFirst, oSecond, nPixels, oSums);
+        return 0;
     }
 
-    void Finish(unsigned int, const SumRow& oSums, const BoxRow& oBoxes, unsigned char* pPixels,
+    void Finish(unsigned int, const SumRow& oSums, const BoxRow& oBoxes, std::size_t nFirst, unsigned char* pPixels,
                 unsigned char* pValid) const override
     {
         const auto* const pSums = reinterpret_cast<const SumOf<T>*>(oSums.mpSums);
         const auto* const pCounts = reinterpret_cast<const std::uint32_t*>(oSums.mpCounts);
-        for (std::size_t nBox = 0; nBox < oBoxes.mnBoxes; ++nBox)
+        for (std::size_t nBox = nFirst; nBox < oBoxes.mnBoxes; ++nBox)
             for (unsigned int n = 0; n < mnSamples; ++n)
             {
                 const std::size_t nAt = nBox * mnSamples + n;
@@ -92,7 +109,8 @@ public:
     }
 
 private:
-    // Samples with those that are not valid made zero, so that they can be added without a look at the counts.
+    // Samples with those that are not valid made zero, so that they can be added
+    // without a look at the counts.
     SumRow Cleared(const SumRow& oRow, std::size_t nPixels, std::vector<T>& oSamples) const
     {
         oSamples.resize(nPixels * mnSamples);
@@ -138,7 +156,8 @@ private:
 };
 
 #if defined(KRV_VECTOR_AVERAGES)
-// By vector instructions, without validity. Wide: the sums from the fifth stage on, where they outgrow the narrow ones.
+// By vector instructions, without validity. Wide: the sums from the fifth stage
+// on, where they outgrow the narrow ones.
 template <typename T, typename Narrow, typename Wide>
 class VectorSteps : public IAverageSteps
 {
@@ -153,53 +172,63 @@ public:
         return nStage == 0 ? sizeof(T) : nStage <= NARROW_STAGES ? sizeof(Narrow) : sizeof(Wide);
     }
 
-    void Sum(unsigned int nStage, const SumRow& oFirst, const SumRow& oSecond, std::size_t nPixels,
-             const SumRow& oSums) const override
+    std::size_t Sum(unsigned int nStage, const SumRow& oFirst, const SumRow& oSecond, std::size_t nPixels,
+                    const SumRow& oSums, [[maybe_unused]] unsigned char* pPixels) const override
     {
         if (nStage == 1)
-            Add<T, Narrow>(oFirst, oSecond, nPixels, oSums);
-        else if (nStage <= NARROW_STAGES)
-            Add<Narrow, Narrow>(oFirst, oSecond, nPixels, oSums);
-        else if (nStage == NARROW_STAGES + 1)
-            Add<Narrow, Wide>(oFirst, oSecond, nPixels, oSums);
-        else
-            Add<Wide, Wide>(oFirst, oSecond, nPixels, oSums);
+            return Add<T, Narrow>(oFirst, oSecond, nPixels, oSums, pPixels);
+        if (nStage <= NARROW_STAGES)
+            return Add<Narrow, Narrow>(oFirst, oSecond, nPixels, oSums);
+        if (nStage == NARROW_STAGES + 1)
+            return Add<Narrow, Wide>(oFirst, oSecond, nPixels, oSums);
+        return Add<Wide, Wide>(oFirst, oSecond, nPixels, oSums);
     }
 
-    void Finish(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, unsigned char* pPixels,
-                unsigned char*) const override
+    void Finish(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, std::size_t nFirst,
+                unsigned char* pPixels, unsigned char*) const override
     {
         if (nStage <= NARROW_STAGES)
-            Round<Narrow>(nStage, oSums, oBoxes, reinterpret_cast<T*>(pPixels));
+            Round<Narrow>(nStage, oSums, oBoxes, nFirst, reinterpret_cast<T*>(pPixels));
         else
-            Round<Wide>(nStage, oSums, oBoxes, reinterpret_cast<T*>(pPixels));
+            Round<Wide>(nStage, oSums, oBoxes, nFirst, reinterpret_cast<T*>(pPixels));
     }
 
 private:
     template <typename In, typename Out>
-    void Add(const SumRow& oFirst, const SumRow& oSecond, std::size_t nPixels, const SumRow& oSums) const
+    std::size_t Add(const SumRow& oFirst, const SumRow& oSecond, std::size_t nPixels, const SumRow& oSums,
+                    [[maybe_unused]] unsigned char* pPixels = nullptr) const
     {
         const auto* const pFirst = reinterpret_cast<const In*>(oFirst.mpSums);
         const auto* const pSecond = reinterpret_cast<const In*>(oSecond.mpSums);
         auto* const pSums = reinterpret_cast<Out*>(oSums.mpSums);
-        SumPairs(pFirst, pSecond, nPixels / 2, mnSamples, pSums);
+        std::size_t nRounded = 0;
+        if constexpr (sizeof(In) == 1)
+        {
+            SumAndRoundPairs(pFirst, pSecond, nPixels / 2, mnSamples, pSums, pPixels);
+            nRounded = pPixels != nullptr ? nPixels / 2 : 0;
+        }
+        else
+            SumPairs(pFirst, pSecond, nPixels / 2, mnSamples, pSums);
         for (std::size_t n = 0; n < mnSamples && nPixels % 2 != 0; ++n)
         {
             const std::size_t nAt = (nPixels - 1) * mnSamples + n;
             pSums[nPixels / 2 * mnSamples + n] = static_cast<Out>(Out(pFirst[nAt]) + Out(pSecond[nAt]));
         }
+        return nRounded;
     }
 
     template <typename Sum>
-    void Round(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, T* pPixels) const
+    void Round(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, std::size_t nFirst, T* pPixels) const
     {
         const auto* const pSums = reinterpret_cast<const Sum*>(oSums.mpSums);
         const bool bLastWhole = oBoxes.mnLastColumns == oBoxes.mnColumns;
-        std::size_t nWhole = oBoxes.mnRows == oBoxes.mnColumns ? oBoxes.mnBoxes - (bLastWhole ? 0 : 1) : 0;
-        RoundSums(pSums, nWhole * mnSamples, 2 * nStage, pPixels);
-        for (; nWhole < oBoxes.mnBoxes; ++nWhole)
-            for (std::size_t n = nWhole * mnSamples; n < (nWhole + 1) * mnSamples; ++n)
-                pPixels[n] = MeanOf<T>(static_cast<SumOf<T>>(pSums[n]), oBoxes.GetSize(nWhole));
+        const std::size_t nWhole = oBoxes.mnRows == oBoxes.mnColumns ? oBoxes.mnBoxes - (bLastWhole ? 0 : 1) : 0;
+        if (nFirst < nWhole)
+            RoundSums(pSums + nFirst * mnSamples, (nWhole - nFirst) * mnSamples, 2 * nStage,
+                      pPixels + nFirst * mnSamples);
+        for (std::size_t nBox = std::max(nFirst, nWhole); nBox < oBoxes.mnBoxes; ++nBox)
+            for (std::size_t n = nBox * mnSamples; n < (nBox + 1) * mnSamples; ++n)
+                pPixels[n] = MeanOf<T>(static_cast<SumOf<T>>(pSums[n]), oBoxes.GetSize(nBox));
     }
 
     unsigned int mnSamples;
@@ -226,7 +255,8 @@ std::unique_ptr<IAverageSteps> MakeSteps(const SourceForm& oForm, [[maybe_unused
                          { return std::make_unique<AnySteps<decltype(nSample)>>(oForm, bHalfValid); });
 }
 
-// Rows of a stage wait for the one below them in a slot of their own; the slots cover all columns.
+// Rows of a stage wait for the one below them in a slot of their own; the slots
+// cover all columns.
 class AverageCascade : public ILevelReducer
 {
 public:
@@ -250,7 +280,8 @@ private:
     SumRow At(unsigned int nStage, unsigned int nX, unsigned int nY);
     SumRow Zeros() { return {moZeros.data(), mbCounts ? moZeros.data() : nullptr}; }
     void AddRows(const SumRow& oFirst, const SumRow& oSecond, unsigned int nX, unsigned int nY, unsigned int nPixels);
-    void PutRow(unsigned int nStage, const SumRow& oSums, unsigned int nX, unsigned int nY, unsigned int nPixels);
+    void PutRow(unsigned int nStage, const SumRow& oSums, unsigned int nX, unsigned int nY, unsigned int nPixels,
+                std::size_t nRounded, unsigned char* pPixels);
 
     SourceForm moForm;
     PixelBounds moBounds;
@@ -311,6 +342,8 @@ void AverageCascade::Add(const SourceWindow& oWindow)
     };
     for (unsigned int nY = oBounds.mnTop; nY < oBounds.mnBottom; ++nY)
     {
+        if (nPitch <= LONGEST_FETCHED_ROW)
+            Fetch(Row(nY).mpSums + FETCHED_AHEAD, nPitch);
         const bool bLast = nY + 1 == oImage.mnHeight;
         if (nY % 2 != 0)
             AddRows(nY > oBounds.mnTop ? Row(nY - 1) : At(0, oBounds.mnLeft, nY - 1), Row(nY), oBounds.mnLeft, nY / 2,
@@ -327,8 +360,8 @@ void AverageCascade::Add(const SourceWindow& oWindow)
     }
 }
 
-// Two rows of the image make a row of the first stage; whenever a row has its pair, or has none, the next stage goes
-// on.
+// Two rows of the image make a row of the first stage; whenever a row has its
+// pair, or has none, the next stage goes on.
 void AverageCascade::AddRows(const SumRow& oFirst, const SumRow& oSecond, unsigned int nX, unsigned int nY,
                              unsigned int nPixels)
 {
@@ -338,10 +371,14 @@ void AverageCascade::AddRows(const SumRow& oFirst, const SumRow& oSecond, unsign
     {
         nX /= 2;
         const SumRow oSums = At(nStage, nX, nY);
-        mpoSteps->Sum(nStage, oAbove, oBelow, nPixels, oSums);
+        const Stage& oStage = moStages[nStage];
+        unsigned char* const pPixels =
+            oStage.mpoTarget != nullptr ? oStage.mpoTarget->Begin(nX, nY, (nPixels + 1) / 2) : nullptr;
+        const std::size_t nRounded = mpoSteps->Sum(nStage, oAbove, oBelow, nPixels, oSums, pPixels);
         nPixels = (nPixels + 1) / 2;
-        PutRow(nStage, oSums, nX, nY, nPixels);
-        const bool bLast = nY + 1 == moStages[nStage].mnHeight;
+        if (pPixels != nullptr)
+            PutRow(nStage, oSums, nX, nY, nPixels, nRounded, pPixels);
+        const bool bLast = nY + 1 == oStage.mnHeight;
         if (nY % 2 == 0 && !bLast)
             return;
         oAbove = At(nStage, nX, nY - nY % 2);
@@ -351,19 +388,18 @@ void AverageCascade::AddRows(const SumRow& oFirst, const SumRow& oSecond, unsign
 }
 
 void AverageCascade::PutRow(unsigned int nStage, const SumRow& oSums, unsigned int nX, unsigned int nY,
-                            unsigned int nPixels)
+                            unsigned int nPixels, std::size_t nRounded, unsigned char* pPixels)
 {
     const Stage& oStage = moStages[nStage];
-    if (oStage.mpoTarget == nullptr)
-        return;
     const std::uint64_t nFactor = std::uint64_t{1} << nStage;
     const bool bLastColumn = nX + nPixels == oStage.mnWidth;
     const BoxRow oBoxes{nPixels, std::min<std::uint64_t>(nFactor, moForm.mnHeight - nY * nFactor), nFactor,
                         bLastColumn ? moForm.mnWidth - (oStage.mnWidth - 1) * nFactor : nFactor};
     if (mbCounts)
         moValid.resize(std::max(moValid.size(), std::size_t{nPixels} * moForm.mnChannels));
-    unsigned char* const pPixels = oStage.mpoTarget->Begin(nX, nY, nPixels);
-    mpoSteps->Finish(nStage, oSums, oBoxes, pPixels, mbCounts ? moValid.data() : nullptr);
+    const std::size_t nFirst = oBoxes.mnRows == nFactor ? nRounded : 0;
+    if (nFirst < nPixels)
+        mpoSteps->Finish(nStage, oSums, oBoxes, nFirst, pPixels, mbCounts ? moValid.data() : nullptr);
     oStage.mpoTarget->End(mbCounts ? moValid.data() : nullptr);
 }
 

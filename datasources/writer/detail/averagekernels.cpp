@@ -22,8 +22,9 @@ void Store(void* pTarget, __m128i oValue)
     _mm_storeu_si128(static_cast<__m128i*>(pTarget), oValue);
 }
 
-// A step takes INPUT samples of each row and makes half as many sums. It may read and write somewhat more: as far as
-// SPAN samples and half as many sums. What it writes too much the next step, or the rest one by one, puts right.
+// A step takes INPUT samples of each row and makes half as many sums. It may
+// read and write somewhat more: as far as SPAN samples and half as many sums.
+// What it writes too much the next step, or the rest one by one, puts right.
 
 // The bytes of neighbouring pixels beside each other, to be added in pairs.
 template <unsigned int N>
@@ -36,21 +37,6 @@ __m128i BesideEachOther(__m128i oPixels)
     else
         return oPixels;
 }
-
-template <unsigned int N>
-struct BytesToWords
-{
-    static constexpr std::size_t INPUT = N == 3 ? 12 : 16;
-    static constexpr std::size_t SPAN = 16;
-
-    static void Step(const std::uint8_t* pFirst, const std::uint8_t* pSecond, std::uint16_t* pSums)
-    {
-        const __m128i oOnes = _mm_set1_epi8(1);
-        const __m128i oFirst = _mm_maddubs_epi16(BesideEachOther<N>(Load(pFirst)), oOnes);
-        const __m128i oSecond = _mm_maddubs_epi16(BesideEachOther<N>(Load(pSecond)), oOnes);
-        Store(pSums, _mm_add_epi16(oFirst, oSecond));
-    }
-};
 
 template <unsigned int N>
 struct WordsToWords
@@ -171,7 +157,8 @@ void RunFor(const T* pFirst, const T* pSecond, std::size_t nPairs, unsigned int 
         Run<Kernel<4>, 4>(pFirst, pSecond, nPairs, pSums);
 }
 
-// The mean rounded down, one more where the rest is above the half, or is the half and the mean is odd.
+// The mean rounded down, one more where the rest is above the half, or is the
+// half and the mean is odd.
 __m128i RoundWords(__m128i oSums, __m128i oShift, __m128i oBelowHalf)
 {
     const __m128i oOdd = _mm_and_si128(_mm_srl_epi16(oSums, oShift), _mm_set1_epi16(1));
@@ -184,6 +171,71 @@ __m128i RoundDoubleWords(__m128i oSums, __m128i oShift, __m128i oBelowHalf)
     return _mm_srl_epi32(_mm_add_epi32(_mm_add_epi32(oSums, oBelowHalf), oOdd), oShift);
 }
 
+// Sums of pairs of pixels of two rows; of pixels of three bytes the first
+// twelve bytes count.
+template <unsigned int N>
+__m128i SumsOf(__m128i oFirst, __m128i oSecond)
+{
+    const __m128i oOnes = _mm_set1_epi8(1);
+    return _mm_add_epi16(_mm_maddubs_epi16(BesideEachOther<N>(oFirst), oOnes),
+                         _mm_maddubs_epi16(BesideEachOther<N>(oSecond), oOnes));
+}
+
+template <unsigned int N>
+void SumBytes(const std::uint8_t* pFirst, const std::uint8_t* pSecond, std::size_t nPairs, std::uint16_t* pSums,
+              std::uint8_t* pMeans)
+{
+    constexpr std::size_t INPUT = N == 3 ? 48 : 32;
+    const __m128i oShift = _mm_cvtsi32_si128(2);
+    const __m128i oBelowHalf = _mm_set1_epi16(1);
+    const std::size_t nInput = 2 * N * nPairs;
+    std::size_t nAt = 0;
+    for (; nAt + INPUT <= nInput; nAt += INPUT)
+    {
+        const std::uint8_t* const pAbove = pFirst + nAt;
+        const std::uint8_t* const pBelow = pSecond + nAt;
+        __m128i aSums[INPUT / 16];
+        if constexpr (N == 3)
+        {
+            // Four times six sums, moved together. The last twelve bytes come by a
+            // load that ends with them.
+            const __m128i oFirst = SumsOf<3>(Load(pAbove), Load(pBelow));
+            const __m128i oSecond = SumsOf<3>(Load(pAbove + 12), Load(pBelow + 12));
+            const __m128i oThird = SumsOf<3>(Load(pAbove + 24), Load(pBelow + 24));
+            const __m128i oFourth =
+                SumsOf<3>(_mm_srli_si128(Load(pAbove + 32), 4), _mm_srli_si128(Load(pBelow + 32), 4));
+            aSums[0] = _mm_or_si128(oFirst, _mm_slli_si128(oSecond, 12));
+            aSums[1] = _mm_or_si128(_mm_srli_si128(oSecond, 4), _mm_slli_si128(oThird, 8));
+            aSums[2] = _mm_or_si128(_mm_srli_si128(oThird, 8), _mm_slli_si128(oFourth, 4));
+            Store(pSums + nAt / 2 + 16, aSums[2]);
+        }
+        else
+        {
+            aSums[0] = SumsOf<N>(Load(pAbove), Load(pBelow));
+            aSums[1] = SumsOf<N>(Load(pAbove + 16), Load(pBelow + 16));
+        }
+        Store(pSums + nAt / 2, aSums[0]);
+        Store(pSums + nAt / 2 + 8, aSums[1]);
+        if (pMeans == nullptr)
+            continue;
+        Store(pMeans + nAt / 2,
+              _mm_packus_epi16(RoundWords(aSums[0], oShift, oBelowHalf), RoundWords(aSums[1], oShift, oBelowHalf)));
+        if constexpr (N == 3)
+        {
+            const __m128i oMeans = RoundWords(aSums[2], oShift, oBelowHalf);
+            _mm_storel_epi64(reinterpret_cast<__m128i*>(pMeans + nAt / 2 + 16), _mm_packus_epi16(oMeans, oMeans));
+        }
+    }
+    for (std::size_t n = nAt / 2; n < N * nPairs; ++n)
+    {
+        const std::size_t nLeft = 2 * N * (n / N) + n % N;
+        const unsigned int nSum = pFirst[nLeft] + pFirst[nLeft + N] + pSecond[nLeft] + pSecond[nLeft + N];
+        pSums[n] = static_cast<std::uint16_t>(nSum);
+        if (pMeans != nullptr)
+            pMeans[n] = static_cast<std::uint8_t>((nSum + 1 + (nSum >> 2 & 1)) >> 2);
+    }
+}
+
 template <typename Sum, typename T>
 void RoundRest(const Sum* pSums, std::size_t nFirst, std::size_t nSums, unsigned int nShift, T* pMeans)
 {
@@ -194,10 +246,15 @@ void RoundRest(const Sum* pSums, std::size_t nFirst, std::size_t nSums, unsigned
 
 } // namespace
 
-void SumPairs(const std::uint8_t* pFirst, const std::uint8_t* pSecond, std::size_t nPairs, unsigned int nSamples,
-              std::uint16_t* pSums)
+void SumAndRoundPairs(const std::uint8_t* pFirst, const std::uint8_t* pSecond, std::size_t nPairs,
+                      unsigned int nSamples, std::uint16_t* pSums, std::uint8_t* pMeans)
 {
-    RunFor<BytesToWords>(pFirst, pSecond, nPairs, nSamples, pSums);
+    if (nSamples == 1)
+        SumBytes<1>(pFirst, pSecond, nPairs, pSums, pMeans);
+    else if (nSamples == 3)
+        SumBytes<3>(pFirst, pSecond, nPairs, pSums, pMeans);
+    else
+        SumBytes<4>(pFirst, pSecond, nPairs, pSums, pMeans);
 }
 
 void SumPairs(const std::uint16_t* pFirst, const std::uint16_t* pSecond, std::size_t nPairs, unsigned int nSamples,

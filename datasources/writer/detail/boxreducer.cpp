@@ -52,7 +52,8 @@ auto RankOf(const Value<T, P>& oValue)
         return static_cast<long double>(oValue[0]) * oValue[0] + static_cast<long double>(oValue[1]) * oValue[1];
 }
 
-// The boxes take one valid value after the other, row by row from the left, and give the value of the level.
+// The boxes take one valid value after the other, row by row from the left, and
+// give the value of the level.
 
 template <typename T, unsigned int P>
 struct AverageBox
@@ -137,8 +138,8 @@ private:
     Value<T, P> moBest{};
 };
 
-// Counts of different values; they are brought together now and then, so that no more than about twice as many are
-// held as there are different ones.
+// Counts of different values; they are brought together now and then, so that
+// no more than about twice as many are held as there are different ones.
 template <typename T, unsigned int P>
 struct ModeBox
 {

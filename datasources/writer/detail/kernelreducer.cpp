@@ -13,8 +13,9 @@ namespace krv::datasources::detail
 namespace
 {
 
-// The weight of a pixel nDistance / (2 * nFactor) boxes away from the centre. Only ratios of weights count: those of
-// bilinear and cubic are whole numbers, so that halves are met exactly.
+// The weight of a pixel nDistance / (2 * nFactor) boxes away from the centre.
+// Only ratios of weights count: those of bilinear and cubic are whole numbers,
+// so that halves are met exactly.
 double WeightOf(Resampling eMethod, double nDistance, double nFactor)
 {
     const double nBox = 2 * nFactor;
@@ -30,14 +31,15 @@ double WeightOf(Resampling eMethod, double nDistance, double nFactor)
     return nAngle == 0 ? 1 : 3 * std::sin(nAngle) * std::sin(nAngle / 3) / (nAngle * nAngle);
 }
 
-// The pixels of an axis that a pixel of the level is made from. All have the same weights but for what the image's
-// edges cut off.
+// The pixels of an axis that a pixel of the level is made from. All have the
+// same weights but for what the image's edges cut off.
 class Taps
 {
 public:
     Taps(Resampling eMethod, unsigned int nFactor, unsigned int nSize) : mnFactor(nFactor), mnSize(nSize)
     {
-        // Twice the centre is (2 * pixel + 1) * factor - 1, and the kernel ends before radius * factor.
+        // Twice the centre is (2 * pixel + 1) * factor - 1, and the kernel ends
+        // before radius * factor.
         const std::int64_t nReach = std::int64_t{2} * nFactor * GetKernelRadius(eMethod);
         const std::int64_t nCentre = std::int64_t{nFactor} - 1;
         mnBegin = -((nReach - 1 - nCentre) / 2);
@@ -75,8 +77,9 @@ private:
     std::vector<double> moWeights;
 };
 
-// Row by row the weighted sums along the row, which then go with the weights of the row to the rows of the level that
-// the kernel reaches. The order of additions is the same whatever part of a level is made.
+// Row by row the weighted sums along the row, which then go with the weights of
+// the row to the rows of the level that the kernel reaches. The order of
+// additions is the same whatever part of a level is made.
 template <typename T>
 class KernelReducer : public ILevelReducer
 {

@@ -22,7 +22,8 @@ unsigned int GetKernelRadius(Resampling eMethod)
     }
 }
 
-// A kernel reaches radius * factor from the centre of a box, of which half a box lies within it.
+// A kernel reaches radius * factor from the centre of a box, of which half a
+// box lies within it.
 PixelBounds GetSourceBounds(const SourceForm& oForm, const LevelTask& oTask, Resampling eMethod)
 {
     const std::uint64_t nFactor = oTask.mnFactor;

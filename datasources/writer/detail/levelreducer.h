@@ -29,8 +29,8 @@ struct PixelBounds
     }
 };
 
-// Pixels of the image, interleaved, rows without padding; for each value a byte, 1 when it is valid and else 0, or null
-// when all are.
+// Pixels of the image, interleaved, rows without padding; for each value a
+// byte, 1 when it is valid and else 0, or null when all are.
 struct SourceWindow
 {
     PixelBounds moBounds;
@@ -60,8 +60,9 @@ struct LevelTask
     LevelTarget* mpoTarget;
 };
 
-// Takes the pixels of the image window by window, row of windows by row of windows, and puts the pixels of levels into
-// their targets as soon as they are known.
+// Takes the pixels of the image window by window, row of windows by row of
+// windows, and puts the pixels of levels into their targets as soon as they are
+// known.
 class ILevelReducer
 {
 public:
@@ -69,9 +70,10 @@ public:
     virtual void Add(const SourceWindow& oWindow) = 0;
 };
 
-// Averages of factors that are powers of two up to 32768, one made from the sums of the other. Windows begin and end at
-// multiples of the largest factor on the x axis, or at the image's edge.
-// oBounds: all the pixels that will come.
+// Averages of factors that are powers of two up to 32768, one made from the
+// sums of the other. Windows begin and end at multiples of the largest factor
+// on the x axis, or at the image's edge. oBounds: all the pixels that will
+// come.
 std::unique_ptr<ILevelReducer> MakeAverageCascade(const SourceForm& oForm, const std::vector<LevelTask>& oTasks,
                                                   const PixelBounds& oBounds, bool bHalfValid);
 
@@ -80,7 +82,8 @@ std::unique_ptr<ILevelReducer> MakeBoxReducer(const SourceForm& oForm, const Lev
                                               const OverviewOptions& oOptions);
 std::unique_ptr<ILevelReducer> MakeKernelReducer(const SourceForm& oForm, const LevelTask& oTask, Resampling eMethod);
 
-// Pixels of the level beyond those whose boxes are touched that a changed pixel of the image has a part in.
+// Pixels of the level beyond those whose boxes are touched that a changed pixel
+// of the image has a part in.
 unsigned int GetKernelRadius(Resampling eMethod);
 
 // The pixels of the image that a part of a level depends on.

@@ -45,14 +45,7 @@ PixelBounds TileGatherer::GetPart(unsigned int nColumn, unsigned int nRow) const
             static_cast<unsigned int>(nRight), static_cast<unsigned int>(nBottom)};
 }
 
-unsigned char* TileGatherer::GetPlace(Tile& oTile, unsigned int nX, unsigned int nY) const
-{
-    const std::size_t nPixel =
-        std::size_t{nY - oTile.moPart.mnTop} * oTile.moPart.GetWidth() + (nX - oTile.moPart.mnLeft);
-    return oTile.mpoRaster->GetBuffer() + nPixel * mnPixelBytes;
-}
-
-unsigned char* TileGatherer::Find(unsigned int nX, unsigned int nY, unsigned int nCount)
+unsigned char* TileGatherer::FindTile(unsigned int nX, unsigned int nY, unsigned int nCount)
 {
     if (!moBounds.Contains(nX, nY) || !moBounds.Contains(nX + nCount - 1, nY))
         return nullptr;
@@ -60,15 +53,12 @@ unsigned char* TileGatherer::Find(unsigned int nX, unsigned int nY, unsigned int
     return oTile.moPart.Contains(nX + nCount - 1, nY) ? GetPlace(oTile, nX, nY) : nullptr;
 }
 
-void TileGatherer::Note(unsigned int nX, unsigned int nY, unsigned int nCount)
+void TileGatherer::StoreLast()
 {
-    Tile& oTile = Get(nX, nY);
-    oTile.mnMissing -= nCount;
-    if (oTile.mnMissing != 0)
-        return;
-    const std::unique_ptr<krv::gobs::Raster> oRaster = std::move(oTile.mpoRaster);
+    const PixelBounds oPart = mpoLast->moPart;
+    const std::unique_ptr<krv::gobs::Raster> oRaster = std::move(mpoLast->mpoRaster);
     mpoLast = nullptr;
-    moTiles.erase({nY / mnTileHeight, nX / mnTileWidth});
+    moTiles.erase({oPart.mnTop / mnTileHeight, oPart.mnLeft / mnTileWidth});
     moStore(*oRaster);
 }
 
@@ -82,7 +72,7 @@ void TileGatherer::Put(unsigned int nX, unsigned int nY, unsigned int nCount, co
         Tile& oTile = Get(nAt, nY);
         const unsigned int nRun = std::min(nEnd, oTile.moPart.mnRight) - nAt;
         std::memcpy(GetPlace(oTile, nAt, nY), pPixels + std::size_t{nAt - nX} * mnPixelBytes, nRun * mnPixelBytes);
-        Note(nAt, nY, nRun);
+        Note(nRun);
         nAt += nRun;
     }
 }
@@ -111,7 +101,7 @@ void LevelTarget::End(const unsigned char* pValid)
     if (pValid != nullptr)
         mpoFinisher->Finish(pPixels, pValid, mnCount);
     if (mpDirect != nullptr)
-        moPixels.Note(mnX, mnY, mnCount);
+        moPixels.Note(mnCount);
     else
         moPixels.Put(mnX, mnY, mnCount, pPixels);
     if (mpoMask == nullptr)

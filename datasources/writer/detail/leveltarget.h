@@ -13,8 +13,8 @@
 namespace krv::datasources::detail
 {
 
-// Gathers rows of pixels into the tiles of a grid and stores each tile when the last of its pixels has come. Every
-// pixel of the bounds comes once.
+// Gathers rows of pixels into the tiles of a grid and stores each tile when the
+// last of its pixels has come. Every pixel of the bounds comes once.
 class TileGatherer
 {
 public:
@@ -23,10 +23,21 @@ public:
     TileGatherer(const PixelBounds& oBounds, unsigned int nTileWidth, unsigned int nTileHeight, unsigned int nChannels,
                  const krv::gobs::DataType& oType, Store oStore);
 
-    // Memory for pixels of a row that lie in one tile and within the bounds; null for others.
-    unsigned char* Find(unsigned int nX, unsigned int nY, unsigned int nCount);
-    // The pixels were written where Find said.
-    void Note(unsigned int nX, unsigned int nY, unsigned int nCount);
+    // Memory for pixels of a row that lie in one tile and within the bounds; null
+    // for others.
+    unsigned char* Find(unsigned int nX, unsigned int nY, unsigned int nCount)
+    {
+        if (mpoLast != nullptr && mpoLast->moPart.Contains(nX, nY) && nX + nCount <= mpoLast->moPart.mnRight)
+            return GetPlace(*mpoLast, nX, nY);
+        return FindTile(nX, nY, nCount);
+    }
+    // As many pixels were written where Find said last.
+    void Note(unsigned int nCount)
+    {
+        mpoLast->mnMissing -= nCount;
+        if (mpoLast->mnMissing == 0)
+            StoreLast();
+    }
     // Any pixels of a row; those outside the bounds are left out.
     void Put(unsigned int nX, unsigned int nY, unsigned int nCount, const unsigned char* pPixels);
 
@@ -39,7 +50,14 @@ private:
     };
 
     Tile& Get(unsigned int nX, unsigned int nY);
-    unsigned char* GetPlace(Tile& oTile, unsigned int nX, unsigned int nY) const;
+    unsigned char* GetPlace(Tile& oTile, unsigned int nX, unsigned int nY) const
+    {
+        const std::size_t nPixel =
+            std::size_t{nY - oTile.moPart.mnTop} * oTile.moPart.GetWidth() + (nX - oTile.moPart.mnLeft);
+        return oTile.mpoRaster->GetBuffer() + nPixel * mnPixelBytes;
+    }
+    unsigned char* FindTile(unsigned int nX, unsigned int nY, unsigned int nCount);
+    void StoreLast();
     PixelBounds GetPart(unsigned int nColumn, unsigned int nRow) const;
 
     PixelBounds moBounds;
@@ -53,7 +71,8 @@ private:
     Tile* mpoLast = nullptr;                                       // the one used last: rows come in runs
 };
 
-// Gives values that are not valid a value, and keeps valid ones apart from the no-data value.
+// Gives values that are not valid a value, and keeps valid ones apart from the
+// no-data value.
 class IValueFinisher
 {
 public:
@@ -61,14 +80,16 @@ public:
     virtual void Finish(unsigned char* pPixels, const unsigned char* pValid, std::size_t nPixels) const = 0;
 };
 
-// Where the pixels of a level go, and those of the mask's level when there is one.
+// Where the pixels of a level go, and those of the mask's level when there is
+// one.
 class LevelTarget
 {
 public:
     LevelTarget(TileGatherer oPixels, const SourceForm& oForm, const IValueFinisher* poFinisher);
     void SetMask(std::unique_ptr<TileGatherer> poMask) { mpoMask = std::move(poMask); }
 
-    // Memory for pixels of a row, which End takes. They may reach outside of what is to be made.
+    // Memory for pixels of a row, which End takes. They may reach outside of what
+    // is to be made.
     unsigned char* Begin(unsigned int nX, unsigned int nY, unsigned int nCount);
     // pValid: a byte per value, or null when all are valid.
     void End(const unsigned char* pValid);

@@ -36,7 +36,8 @@ bool IsSet(const unsigned char* pBits, std::size_t nBit)
     return (pBits[nBit / 8] & 128u >> nBit % 8) != 0;
 }
 
-// The value as a sample; nothing when the type has no such value. Widened texts of the limits of 32R are these limits.
+// The value as a sample; nothing when the type has no such value. Widened texts
+// of the limits of 32R are these limits.
 template <typename T>
 std::optional<T> ToSample(const NoDataValue& oValue)
 {
@@ -77,7 +78,8 @@ T Above(T nValue)
         return nValue < std::numeric_limits<T>::max() ? static_cast<T>(nValue + 1) : static_cast<T>(nValue - 1);
 }
 
-// Complex values: the no-data value is that of the real part, the imaginary one is 0, or NaN with it.
+// Complex values: the no-data value is that of the real part, the imaginary one
+// is 0, or NaN with it.
 template <typename T>
 class ValueFinisher : public IValueFinisher
 {
@@ -153,7 +155,8 @@ SampleValidity::SampleValidity(IRasterWriter& oWriter, const OverviewOptions& oO
 
 SampleValidity::~SampleValidity() = default;
 
-// Of a single channel the source says all, as long as nobody else speaks for it.
+// Of a single channel the source says all, as long as nobody else speaks for
+// it.
 void SampleValidity::AddChannels(const AuxiliaryData& oMetadata, const krv::gobs::DataType& oType, bool bNaN)
 {
     const bool bAllSaid = oMetadata.GetChannelCount() == 1 && mpoOwned != nullptr;

@@ -15,8 +15,8 @@ class IRasterWriter;
 namespace krv::datasources::detail
 {
 
-// Which samples of a writer's rasters take part in levels: those of valid pixels that are not their own channel's
-// no-data value.
+// Which samples of a writer's rasters take part in levels: those of valid
+// pixels that are not their own channel's no-data value.
 class SampleValidity
 {
 public:
@@ -28,7 +28,8 @@ public:
     bool IsNeeded() const { return mpoPixels != nullptr || !moChannels.empty(); }
     // Whether a mask bitmap takes part.
     bool HasBitmap() const { return mbBitmap; }
-    // A byte per value of the raster, which has no margins; valid until the next call.
+    // A byte per value of the raster, which has no margins; valid until the next
+    // call.
     const unsigned char* Mark(const krv::gobs::Raster& oRaster);
 
 private:
