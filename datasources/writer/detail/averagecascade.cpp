@@ -376,7 +376,10 @@ void AverageCascade::AddRows(const SumRow& oFirst, const SumRow& oSecond, unsign
             oStage.mpoTarget != nullptr ? oStage.mpoTarget->Begin(nX, nY, (nPixels + 1) / 2) : nullptr;
         const std::size_t nRounded = mpoSteps->Sum(nStage, oAbove, oBelow, nPixels, oSums, pPixels);
         nPixels = (nPixels + 1) / 2;
-        if (pPixels != nullptr)
+        const bool bDone = nRounded == nPixels && (std::uint64_t{nY} + 1) << nStage <= moForm.mnHeight;
+        if (pPixels != nullptr && bDone)
+            oStage.mpoTarget->End(nullptr);
+        else if (pPixels != nullptr)
             PutRow(nStage, oSums, nX, nY, nPixels, nRounded, pPixels);
         const bool bLast = nY + 1 == oStage.mnHeight;
         if (nY % 2 == 0 && !bLast)

@@ -189,7 +189,8 @@ void SumBytes(const std::uint8_t* pFirst, const std::uint8_t* pSecond, std::size
     const __m128i oShift = _mm_cvtsi32_si128(2);
     const __m128i oBelowHalf = _mm_set1_epi16(1);
     const std::size_t nInput = 2 * N * nPairs;
-    std::size_t nAt = 0;
+    std::size_t nAt =
+        __builtin_cpu_supports("avx2") ? 2 * SumAndRoundByAvx2(pFirst, pSecond, nInput, N, pSums, pMeans) : 0;
     for (; nAt + INPUT <= nInput; nAt += INPUT)
     {
         const std::uint8_t* const pAbove = pFirst + nAt;

@@ -28,6 +28,11 @@ void SumPairs(const double* pFirst, const double* pSecond, std::size_t nPairs, u
 void SumAndRoundPairs(const std::uint8_t* pFirst, const std::uint8_t* pSecond, std::size_t nPairs,
                       unsigned int nSamples, std::uint16_t* pSums, std::uint8_t* pMeans);
 
+// As much of it as wide vectors take, of nInput bytes in a row; gives how many sums that are. Only for processors that
+// have AVX2.
+std::size_t SumAndRoundByAvx2(const std::uint8_t* pFirst, const std::uint8_t* pSecond, std::size_t nInput,
+                              unsigned int nSamples, std::uint16_t* pSums, std::uint8_t* pMeans);
+
 // Sums of 2 to the power of nShift samples each to their means, half to even.
 void RoundSums(const std::uint16_t* pSums, std::size_t nSums, unsigned int nShift, std::uint8_t* pMeans);
 void RoundSums(const std::uint32_t* pSums, std::size_t nSums, unsigned int nShift, std::uint8_t* pMeans);

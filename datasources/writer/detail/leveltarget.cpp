@@ -83,19 +83,13 @@ LevelTarget::LevelTarget(TileGatherer oPixels, const SourceForm& oForm, const IV
 {
 }
 
-unsigned char* LevelTarget::Begin(unsigned int nX, unsigned int nY, unsigned int nCount)
+unsigned char* LevelTarget::BeginApart()
 {
-    mnX = nX;
-    mnY = nY;
-    mnCount = nCount;
-    mpDirect = moPixels.Find(nX, nY, nCount);
-    if (mpDirect != nullptr)
-        return mpDirect;
-    moRow.resize(std::max(moRow.size(), nCount * mnPixelBytes));
+    moRow.resize(std::max(moRow.size(), mnCount * mnPixelBytes));
     return moRow.data();
 }
 
-void LevelTarget::End(const unsigned char* pValid)
+void LevelTarget::EndRow(const unsigned char* pValid)
 {
     unsigned char* const pPixels = mpDirect != nullptr ? mpDirect : moRow.data();
     if (pValid != nullptr)

@@ -90,11 +90,27 @@ public:
 
     // Memory for pixels of a row, which End takes. They may reach outside of what
     // is to be made.
-    unsigned char* Begin(unsigned int nX, unsigned int nY, unsigned int nCount);
+    unsigned char* Begin(unsigned int nX, unsigned int nY, unsigned int nCount)
+    {
+        mnX = nX;
+        mnY = nY;
+        mnCount = nCount;
+        mpDirect = moPixels.Find(nX, nY, nCount);
+        return mpDirect != nullptr ? mpDirect : BeginApart();
+    }
     // pValid: a byte per value, or null when all are valid.
-    void End(const unsigned char* pValid);
+    void End(const unsigned char* pValid)
+    {
+        if (mpDirect != nullptr && pValid == nullptr && mpoMask == nullptr)
+            moPixels.Note(mnCount);
+        else
+            EndRow(pValid);
+    }
 
 private:
+    unsigned char* BeginApart();
+    void EndRow(const unsigned char* pValid);
+
     TileGatherer moPixels;
     std::unique_ptr<TileGatherer> mpoMask;
     const IValueFinisher* mpoFinisher; // borrowed
