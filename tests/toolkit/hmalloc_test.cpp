@@ -152,6 +152,16 @@ TEST(BlockPoolTest, SmallBlocksAreNotKept)
     EXPECT_EQ(oPool->GetPeakBytes(), 0u);
 }
 
+// A block that serves a smaller request for want of a better one does not keep out the size that is wanted.
+TEST(BlockPoolTest, LargeEnoughIsNotWanted)
+{
+    TestPool oPool;
+    oPool.Cycle({2 * MIB});
+    for (int i = 0; i < 6; ++i)
+        oPool.Cycle({900 * KIB, 4 * MIB});
+    EXPECT_EQ(oPool->GetKeptBytes(), 900 * KIB + 4 * MIB);
+}
+
 TEST(BlockPoolTest, BlocksThatNobodyWantsMakeRoom)
 {
     TestPool oPool;

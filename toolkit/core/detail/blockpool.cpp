@@ -107,7 +107,9 @@ BlockPool::Block* BlockPool::TakeFor(std::size_t nBytes) noexcept
             continue;
         if (Block* poBlock = Take(moClasses[nClass]))
         {
-            moClasses[nClass].mbWanted.store(true, std::memory_order_relaxed);
+            // A block that is merely large enough is not wanted for its size: it may give way to those that are.
+            if (nClass == nFirst)
+                moClasses[nClass].mbWanted.store(true, std::memory_order_relaxed);
             poBlock->mnRequested = nBytes;
             poBlock->mnTouched = std::max(poBlock->mnTouched, nBytes);
             return poBlock;

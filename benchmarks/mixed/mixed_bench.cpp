@@ -1,0 +1,164 @@
+// Measures reading a stack of images of different types as one type against reading the groups of one type by
+// themselves, tile by tile: through readers of the files, and from a DEMO file that the stack is written to.
+//     krv_bench_mixed FOLDER FILE FILE...
+// The files are images of one size; FOLDER takes the stack.
+
+#include "benchmarks/support/measure.h"
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/irasterio.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "datasources/reader/basicreader.h"
+#include "datasources/reader/multitypereader.h"
+#include "gobs/raster/raster.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <filesystem>
+#include <map>
+#include <memory>
+#include <numeric>
+#include <string>
+#include <vector>
+
+namespace
+{
+
+using namespace krv::benchmarks;
+using namespace krv::datasources;
+using krv::gobs::DataType;
+using krv::gobs::Raster;
+
+constexpr int ROUNDS = 9;
+constexpr double BYTES_A_PASS = 256e6;
+using Readers = std::vector<std::unique_ptr<IRasterReader>>;
+
+struct Layer
+{
+    std::string moFile;
+    unsigned int mnChannel;
+    DataType moType;
+};
+
+std::vector<Layer> FindLayers(const std::vector<std::string>& oFiles)
+{
+    std::vector<Layer> oLayers;
+    for (const std::string& file : oFiles)
+    {
+        const BasicReader oReader(file);
+        for (unsigned int nChannel = 1; nChannel <= oReader.GetChansCount(); ++nChannel)
+            oLayers.push_back({file, nChannel, oReader.GetDataType()});
+    }
+    return oLayers;
+}
+
+void WriteStack(const std::string& stack, const std::vector<Layer>& oLayers)
+{
+    BasicReader oFirst(oLayers.front().moFile, {oLayers.front().mnChannel});
+    std::vector<DataType> oTypes;
+    for (const Layer& oLayer : oLayers)
+        oTypes.push_back(oLayer.moType);
+    const std::unique_ptr<IDataset> oDataset(DatasetManager::GetInstance()->NewDataset(stack, "DEMO", ""));
+    auto& oRasters = dynamic_cast<IRasterDataset&>(*oDataset);
+    oRasters.Create(oFirst.GetWidth(), oFirst.GetHeight(), oTypes);
+    for (unsigned int nLayer = 0; nLayer < oLayers.size(); ++nLayer)
+    {
+        BasicReader oReader(oLayers[nLayer].moFile, {oLayers[nLayer].mnChannel});
+        const std::unique_ptr<Raster> oRaster(oReader.ReadRaster(0, 0, oFirst.GetWidth(), oFirst.GetHeight()));
+        const std::unique_ptr<IRasterIO> oIO(oRasters.GetRasterIO({nLayer + 1}));
+        oIO->WriteWindow(0u, 0u, oFirst.GetWidth(), oFirst.GetHeight(), oRaster->GetBuffer());
+    }
+    oDataset->Close();
+}
+
+void ReadTiles(IRasterReader& oReader)
+{
+    for (unsigned int nTile = 0; nTile < oReader.GetTileCount(); ++nTile)
+        Keep(std::unique_ptr<Raster>(oReader.GetRaster(nTile))->GetBuffer());
+}
+
+void Measure(const std::string& name, IRasterReader& oMixed, const Readers& oGroups)
+{
+    for (const auto& oGroup : oGroups)
+        oGroup->SetTileSize(oMixed.GetTileWidth(), oMixed.GetTileHeight());
+    const double nBytes = 1.0 * oMixed.GetWidth() * oMixed.GetHeight() * oMixed.GetChansCount() *
+                          static_cast<double>(oMixed.GetDataType().GetValueBits()) / 8;
+    // A pass of some length, so that memory that the other candidate's sizes displaced does not count.
+    const int nRepeats = std::max(1, static_cast<int>(BYTES_A_PASS / nBytes));
+    const auto oRepeat = [nRepeats](IRasterReader& oReader)
+    {
+        for (int n = 0; n < nRepeats; ++n)
+            ReadTiles(oReader);
+    };
+    const auto oTimes = MedianSeconds({{"mixed",
+                                        [&]
+                                        {
+                                            oRepeat(oMixed);
+                                        }},
+                                       {"groups",
+                                        [&]
+                                        {
+                                            for (const auto& oGroup : oGroups)
+                                                oRepeat(*oGroup);
+                                        }}},
+                                      ROUNDS);
+    PrintRow(name + ", " + std::to_string(oMixed.GetChansCount()) + " x " + oMixed.GetDataType().Describe(),
+             oTimes[1] / oTimes[0], 0.8,
+             Number(nBytes * nRepeats / oTimes[0] / 1e6, 0) + " MB/s of the result, tiles of " +
+                 std::to_string(oMixed.GetTileWidth()) + " x " + std::to_string(oMixed.GetTileHeight()));
+}
+
+void MeasureStack(const std::string& stack, const std::vector<Layer>& oLayers, const DataType& oType)
+{
+    std::vector<unsigned int> oNumbers(oLayers.size());
+    std::iota(oNumbers.begin(), oNumbers.end(), 1u);
+    MultiTypeReader oMixed(stack, oNumbers, oType, eOwnPlace);
+    std::map<DataType, std::vector<unsigned int>> oByType;
+    for (unsigned int nLayer = 0; nLayer < oLayers.size(); ++nLayer)
+        oByType[oLayers[nLayer].moType].push_back(nLayer + 1);
+    Readers oGroups;
+    for (const auto& [oGroupType, oChannels] : oByType)
+        oGroups.push_back(std::make_unique<BasicReader>(stack, oChannels));
+    Measure("DEMO stack", oMixed, oGroups);
+}
+
+void MeasureFiles(IDataset& oDataset, const std::vector<Layer>& oLayers, const DataType& oType)
+{
+    std::vector<IRasterReader*> oTakenOver;
+    std::vector<unsigned int> oNumbers;
+    Readers oGroups;
+    for (const Layer& oLayer : oLayers)
+    {
+        oNumbers.push_back(oLayer.mnChannel);
+        oTakenOver.push_back(new BasicReader(oLayer.moFile, {oLayer.mnChannel}));
+        oGroups.push_back(std::make_unique<BasicReader>(oLayer.moFile, std::vector{oLayer.mnChannel}));
+    }
+    MultiTypeReader oMixed(&oDataset, oTakenOver, oNumbers, oType);
+    Measure("the files", oMixed, oGroups);
+}
+
+} // namespace
+
+int main(int nArguments, char** pArguments)
+{
+    if (nArguments < 4)
+    {
+        std::fprintf(stderr, "usage: krv_bench_mixed FOLDER FILE FILE...\n");
+        return 2;
+    }
+    const std::string stack = std::string(pArguments[1]) + "/stack.demo";
+    std::filesystem::create_directories(pArguments[1]);
+    const std::vector<Layer> oLayers = FindLayers({pArguments + 2, pArguments + nArguments});
+    WriteStack(stack, oLayers);
+    const std::unique_ptr<IDataset> oDataset(DatasetManager::GetInstance()->Open(oLayers.front().moFile, eReadOnly));
+    PrintHeading("Several types as one against the groups by themselves");
+    std::vector<DataType> oTypes;
+    for (const Layer& oLayer : oLayers)
+        oTypes.push_back(oLayer.moType);
+    for (const DataType& oType : {krv::gobs::PromoteType(oTypes), DataType(krv::gobs::eDT_64R)})
+    {
+        MeasureStack(stack, oLayers, oType);
+        MeasureFiles(*oDataset, oLayers, oType);
+    }
+    return 0;
+}
