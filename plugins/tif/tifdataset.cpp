@@ -195,7 +195,7 @@ void TifDataset::Close()
 {
     if (mpoEditor && !mpoEditor->IsEnded())
     {
-        mpoEditor->Synchronize();
+        mpoEditor->Finish();
         mpoEditor->End();
     }
     Dataset::Close();

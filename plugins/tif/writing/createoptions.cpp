@@ -77,6 +77,8 @@ bool ApplyLayout(const Setting& oSetting, CreateOptions& oOptions)
     else if (oSetting.moKey == "BIGTIFF")
         oOptions.meBigTiff =
             oSetting.Choose<Choice>({{"AUTO", Choice::eAutomatic}, {"YES", Choice::eYes}, {"NO", Choice::eNo}});
+    else if (oSetting.moKey == "LAYOUT")
+        oOptions.mbCloud = oSetting.Choose<bool>({{"PLAIN", false}, {"COG", true}});
     else
         return false;
     return true;
@@ -123,6 +125,8 @@ bool ApplyMeaning(const Setting& oSetting, CreateOptions& oOptions)
 
 void CheckTogether(const CreateOptions& oOptions, const Place& oPlace)
 {
+    if (oOptions.mbCloud && !oOptions.mbTiled)
+        throw DataException("The option LAYOUT=COG takes tiles; it does not go with TILED=NO", oPlace);
     if (oOptions.mbTiled && (oOptions.mnBlockWidth % 16 != 0 || oOptions.mnBlockHeight % 16 != 0))
         throw DataException("The sides of tiles (BLOCKXSIZE, BLOCKYSIZE) are multiples of 16", oPlace);
     if (!oOptions.moLevel)

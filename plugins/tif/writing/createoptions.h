@@ -27,6 +27,7 @@ struct CreateOptions
     // 1 to 3, or 0: differences of integers, byte planes of reals, none for complex numbers.
     std::uint16_t mnPredictor = 0;
     bool mbSeparate = false;
+    bool mbCloud = false; // directories first, levels from small to large
     Choice meBigTiff = Choice::eAutomatic;
     std::optional<std::uint16_t> moPhotometric;
     std::uint16_t mnAlpha = 0; // ExtraSamples of the last channel

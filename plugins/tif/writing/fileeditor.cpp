@@ -1,5 +1,7 @@
 #include "plugins/tif/writing/fileeditor.h"
 
+#include "plugins/tif/writing/cloudlayout.h"
+#include "plugins/tif/writing/directorybytes.h"
 #include "plugins/tif/writing/pagewriter.h"
 #include "toolkit/exceptions/exceptions.h"
 
@@ -418,11 +420,8 @@ std::uint64_t FileEditor::OwnStrile(PageModel& oPage, std::uint64_t nStrile, std
 // The directory, then the values that are not in the file yet, in one piece; the arrays each in a place of their own.
 FileEditor::Written FileEditor::WriteDirectory(PageModel& oPage, std::uint64_t nNext, bool bDraft)
 {
-    const bool bBig = moHeader.mbBigTiff;
-    const bool bOrder = moHeader.mbBigEndian;
-    const std::size_t nWord = bBig ? 8 : 4;
+    const std::size_t nWord = moHeader.mbBigTiff ? 8 : 4;
     const std::uint64_t nStriles = oPage.GetStriles();
-    const std::uint16_t nArrayType = bBig ? TIFF_LONG8 : TIFF_LONG;
     Written oWritten{&oPage, {}, nNext, oPage.moOffsetArray, oPage.moCountArray};
 
     const auto WriteArray = [&](const std::vector<std::uint64_t>& oValues, Extent& oArray)
@@ -430,10 +429,7 @@ FileEditor::Written FileEditor::WriteDirectory(PageModel& oPage, std::uint64_t n
         if (nStriles * nWord <= nWord || bDraft ||
             (!oPage.mbStrilesChanged && !oPage.mbArraysStale && oArray.mnBytes != 0))
             return;
-        std::vector<unsigned char> oBytes;
-        oBytes.reserve(nStriles * nWord);
-        for (const std::uint64_t nValue : oValues)
-            AppendNumber(oBytes, nValue, nWord, bOrder);
+        const std::vector<unsigned char> oBytes = MakeArray(oValues, moHeader);
         oArray = mpoSpace->Allocate(oBytes.size());
         mpoFile->Write(oArray.mnOffset, oBytes.data(), oBytes.size());
     };
@@ -449,48 +445,11 @@ FileEditor::Written FileEditor::WriteDirectory(PageModel& oPage, std::uint64_t n
             oTag.moStored = oPlace;
         }
 
-    std::vector<unsigned char> oBytes;
-    AppendNumber(oBytes, oTags.size() + 2, bBig ? 8 : 2, bOrder);
-    const auto AddEntry = [&](std::uint16_t nTag, std::uint16_t nType, std::uint64_t nCount)
-    {
-        AppendNumber(oBytes, nTag, 2, bOrder);
-        AppendNumber(oBytes, nType, 2, bOrder);
-        AppendNumber(oBytes, nCount, nWord, bOrder);
-    };
-    const auto AddArray = [&](std::uint16_t nTag, const std::vector<std::uint64_t>& oValues, const Extent& oArray)
-    {
-        AddEntry(nTag, nArrayType, nStriles);
-        AppendNumber(oBytes,
-                     nStriles == 1 ? oValues.front()
-                     : bDraft      ? moHeader.GetBytes()
-                                   : oArray.mnOffset,
-                     nWord, bOrder);
-    };
-    const std::uint16_t nOffsets = oPage.IsTiled() ? TIFFTAG_TILEOFFSETS : TIFFTAG_STRIPOFFSETS;
-    const std::uint16_t nCounts = oPage.IsTiled() ? TIFFTAG_TILEBYTECOUNTS : TIFFTAG_STRIPBYTECOUNTS;
-    bool bOffsets = false;
-    bool bCounts = false;
-    const auto AddArraysBefore = [&](unsigned int nTag)
-    {
-        if (!bOffsets && nTag > nOffsets)
-            AddArray(nOffsets, oPage.moOffsets, oWritten.moOffsetArray), bOffsets = true;
-        if (!bCounts && nTag > nCounts)
-            AddArray(nCounts, oPage.moByteCounts, oWritten.moCountArray), bCounts = true;
-    };
-    for (const Tag& oTag : oTags)
-    {
-        AddArraysBefore(oTag.mnTag);
-        AddEntry(oTag.mnTag, oTag.mnType, oTag.mnCount);
-        if (oTag.GetBytes() > nWord)
-            AppendNumber(oBytes, oTag.moStored.mnOffset, nWord, bOrder);
-        else
-        {
-            oBytes.insert(oBytes.end(), oTag.moBytes.begin(), oTag.moBytes.end());
-            oBytes.resize(oBytes.size() + nWord - oTag.moBytes.size());
-        }
-    }
-    AddArraysBefore(UINT32_MAX);
-    AppendNumber(oBytes, nNext, nWord, bOrder);
+    // A directory that is only written ahead names no arrays: whoever reads by it knows the places.
+    const std::uint64_t nNone = moHeader.GetBytes();
+    const std::vector<unsigned char> oBytes =
+        MakeDirectory(oPage, moHeader, bDraft ? nNone : oWritten.moOffsetArray.mnOffset,
+                      bDraft ? nNone : oWritten.moCountArray.mnOffset, nNext);
     oWritten.moDirectory = mpoSpace->Allocate(oBytes.size());
     mpoFile->Write(oWritten.moDirectory.mnOffset, oBytes.data(), oBytes.size());
     return oWritten;
@@ -583,6 +542,37 @@ void FileEditor::Synchronize()
     if (moTemporary.empty())
         return;
     mpoFile->Rename(moFileName);
+    moTemporary.clear();
+    mbNamed = true;
+}
+
+// A file that is to be laid out for a network gets its order at the very end: a second temporary file takes its place.
+void FileEditor::Finish()
+{
+    if (!moOptions.mbCloud || !HasPages())
+        return Synchronize();
+    CheckWritable();
+    StoreHeld();
+    if (IsChanged())
+        Commit(WriteDirectories());
+    for (const std::shared_ptr<PageModel>& poPage : moPages)
+        LoadTags(*poPage);
+    const std::string laidOut = support::MakeTemporaryName(moFileName);
+    try
+    {
+        support::File oTarget(laidOut, support::File::Mode::eCreate);
+        oTarget.ShowAs(moFileName);
+        WriteCloudLayout(moPages, moHeader, *mpoFile, oTarget);
+        oTarget.Flush();
+        oTarget.Rename(moFileName);
+    }
+    catch (...)
+    {
+        std::remove(laidOut.c_str());
+        throw;
+    }
+    if (!moTemporary.empty())
+        std::remove(moTemporary.c_str());
     moTemporary.clear();
     mbNamed = true;
 }

@@ -71,6 +71,8 @@ public:
     // Whether anything changed since the last Synchronize; blocks that are held back do not count.
     bool IsChanged() const;
     void Synchronize();
+    // The same for the last time: lays the file out as its options say. Pages are of no use afterwards.
+    void Finish();
     // Ends writing, without storing anything. Reading goes on.
     void End();
     bool IsEnded() const { return mbEnded; }

@@ -331,6 +331,77 @@ TEST(TifPaths, SeveralBitmapsAreWrittenTogether)
     EXPECT_TRUE(ReadAll(*poUntouched, 1) == Bytes(61 * 43, 0));
 }
 
+// Directories and their values stand before all blocks, from the image to the smallest level; blocks the other way.
+TEST(TifPaths, ACloudOptimisedFileIsInItsOrder)
+{
+    EXPECT_THROW(CreateTif("none.tif", "LAYOUT=COG TILED=NO"), krv::DataException);
+    const TempFolder oFolder;
+    for (const char* pOptions : {"", " BIGTIFF=YES COMPRESS=ZSTD"})
+    {
+        const std::string fileName = oFolder.File("cog.tif");
+        const auto Create = [&](const std::string& options, const std::string& name)
+        {
+            TifPointer poDataset =
+                CreateTif(name, "BLOCKXSIZE=32 BLOCKYSIZE=32" + options, 300, 200, 3, krv::gobs::eDT_8U);
+            const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poDataset->GetOverviewManager());
+            for (const unsigned int nLevel : {4U, 2U})
+            {
+                poLevels->CreateLevel(nLevel);
+                const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(nLevel, {1, 2, 3}));
+                WriteAll(*poIO, 3, MakePixels(300 / nLevel, 200 / nLevel, 3, krv::gobs::eDT_8U, nLevel));
+            }
+            poDataset->SetBitmapDescription(poDataset->CreateBitmap(), "");
+            WriteAll(*poDataset, MakePixels(300, 200, 3, krv::gobs::eDT_8U, 1));
+            AuxiliaryData oRecord(3);
+            oRecord.SetFileMetadataValue("Note", std::string(9000, 'x'));
+            poDataset->WriteAuxiliaryData(oRecord);
+            poDataset->Close();
+        };
+        Create(pOptions + std::string(" LAYOUT=COG"), fileName);
+        EXPECT_EQ(ListFolder(oFolder.GetPath()), std::vector<std::string>{"cog.tif"});
+        TIFF* const poTiff = TIFFOpen(fileName.c_str(), "r");
+        std::uint64_t nLastDirectory = 0, nFirstBlock = UINT64_MAX, nEarliestBefore = UINT64_MAX;
+        std::vector<std::uint32_t> oWidths;
+        do
+        {
+            EXPECT_GT(TIFFCurrentDirOffset(poTiff), nLastDirectory);
+            nLastDirectory = TIFFCurrentDirOffset(poTiff);
+            std::uint32_t nWidth = 0;
+            TIFFGetField(poTiff, TIFFTAG_IMAGEWIDTH, &nWidth);
+            oWidths.push_back(nWidth);
+            std::uint64_t nEarliest = UINT64_MAX, nBefore = 0;
+            for (std::uint32_t nTile = 0; nTile < TIFFNumberOfTiles(poTiff); ++nTile)
+            {
+                const std::uint64_t nOffset = TIFFGetStrileOffset(poTiff, nTile);
+                if (TIFFGetStrileByteCount(poTiff, nTile) == 0)
+                    continue;
+                EXPECT_GT(nOffset, nBefore);
+                nBefore = nOffset;
+                nEarliest = std::min(nEarliest, nOffset);
+            }
+            EXPECT_TRUE(nEarliest == UINT64_MAX || nEarliest < nEarliestBefore);
+            nEarliestBefore = std::min(nEarliest, nEarliestBefore);
+            nFirstBlock = std::min(nFirstBlock, nEarliest);
+        } while (TIFFReadDirectory(poTiff) == 1);
+        TIFFSetDirectory(poTiff, 0);
+        EXPECT_EQ(TIFFCurrentDirOffset(poTiff), *pOptions == 0 ? 8U : 16U);
+        TIFFClose(poTiff);
+        EXPECT_EQ(oWidths, (std::vector<std::uint32_t>{300, 300, 150, 75}));
+        EXPECT_GT(nFirstBlock, nLastDirectory);
+        EXPECT_GT(nFirstBlock, ReadFile(fileName).rfind("xxxx")) << "a value stands behind a block";
+
+        const std::string plain = oFolder.File("plain.tif");
+        Create(pOptions, plain);
+        const TifPointer poCloud = OpenTif(fileName), poPlain = OpenTif(plain);
+        EXPECT_TRUE(ReadAll(*poCloud) == ReadAll(*poPlain));
+        EXPECT_EQ(poCloud->ReadAuxiliaryData().GetFileMetadata(), poPlain->ReadAuxiliaryData().GetFileMetadata());
+        EXPECT_EQ(poCloud->GetBitmapList(), poPlain->GetBitmapList());
+        EXPECT_EQ(Judge(fileName, 2).moComplaints, "");
+        EXPECT_TRUE(Judge(fileName, 2).moPixels == Judge(plain, 2).moPixels);
+        std::filesystem::remove(plain);
+    }
+}
+
 TEST(TifPaths, AClassicFileThatIsFullAndAFileThatIsOnlyReadSaySo)
 {
     const TempFolder oFolder;

@@ -1,0 +1,113 @@
+#include "plugins/tif/writing/cloudlayout.h"
+
+#include "plugins/tif/writing/directorybytes.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <tiff.h>
+
+namespace krv::plugins::tif
+{
+
+namespace
+{
+
+constexpr std::size_t COPY_BYTES = std::size_t{1} << 20;
+
+// A page with the places that it gets.
+struct Placed
+{
+    PageModel moPage;
+    const PageModel* mpOld;
+    Extent moOffsetArray;
+    Extent moCountArray;
+};
+
+std::uint64_t GetPixels(const PageModel& oPage)
+{
+    return oPage.moTags.GetNumber(TIFFTAG_IMAGEWIDTH, 0) * oPage.moTags.GetNumber(TIFFTAG_IMAGELENGTH, 0);
+}
+
+// The image, its masks, and the levels from large to small.
+std::vector<Placed> Sort(const std::vector<std::shared_ptr<PageModel>>& oPages)
+{
+    std::vector<Placed> oSorted;
+    for (const std::shared_ptr<PageModel>& poPage : oPages)
+        oSorted.push_back({*poPage, poPage.get(), {}, {}});
+    std::stable_sort(oSorted.begin() + 1, oSorted.end(),
+                     [](const Placed& oFirst, const Placed& oSecond)
+                     { return GetPixels(oFirst.moPage) > GetPixels(oSecond.moPage); });
+    return oSorted;
+}
+
+void PlaceDirectory(Placed& oPlaced, const FileHeader& oHeader, Space& oSpace)
+{
+    const std::size_t nWord = oHeader.mbBigTiff ? 8 : 4;
+    PageModel& oPage = oPlaced.moPage;
+    oPage.moDirectory = oSpace.Allocate(GetDirectoryBytes(oPage, oHeader));
+    for (Tag& oTag : oPage.moTags.GetTags())
+        if (oTag.GetBytes() > nWord)
+            oTag.moStored = oSpace.Allocate(oTag.GetBytes());
+    if (oPage.GetStriles() < 2)
+        return;
+    oPlaced.moOffsetArray = oSpace.Allocate(oPage.GetStriles() * nWord);
+    oPlaced.moCountArray = oSpace.Allocate(oPage.GetStriles() * nWord);
+}
+
+void CopyBlocks(Placed& oPlaced, const support::File& oSource, Space& oSpace, support::File& oTarget)
+{
+    std::vector<unsigned char> oBytes;
+    PageModel& oPage = oPlaced.moPage;
+    for (std::size_t nAt = 0; nAt < oPage.GetStriles(); ++nAt)
+    {
+        const std::uint64_t nBytes = oPage.moByteCounts[nAt];
+        oPage.moOffsets[nAt] = 0;
+        if (nBytes == 0)
+            continue;
+        const Extent oNew = oSpace.Allocate(nBytes);
+        for (std::uint64_t nDone = 0; nDone < nBytes; nDone += oBytes.size())
+        {
+            oBytes.resize(std::min<std::uint64_t>(nBytes - nDone, COPY_BYTES));
+            oSource.Read(oPlaced.mpOld->moOffsets[nAt] + nDone, oBytes.data(), oBytes.size());
+            oTarget.Write(oNew.mnOffset + nDone, oBytes.data(), oBytes.size());
+        }
+        oPage.moOffsets[nAt] = oNew.mnOffset;
+    }
+}
+
+void WriteDirectory(const Placed& oPlaced, const FileHeader& oHeader, std::uint64_t nNext, support::File& oTarget)
+{
+    const auto Write = [&oTarget](const Extent& oPlace, const std::vector<unsigned char>& oBytes)
+    {
+        if (oPlace.mnBytes != 0)
+            oTarget.Write(oPlace.mnOffset, oBytes.data(), oBytes.size());
+    };
+    const PageModel& oPage = oPlaced.moPage;
+    Write(oPage.moDirectory,
+          MakeDirectory(oPage, oHeader, oPlaced.moOffsetArray.mnOffset, oPlaced.moCountArray.mnOffset, nNext));
+    for (const Tag& oTag : oPage.moTags.GetTags())
+        Write(oTag.moStored, oTag.moBytes);
+    Write(oPlaced.moOffsetArray, MakeArray(oPage.moOffsets, oHeader));
+    Write(oPlaced.moCountArray, MakeArray(oPage.moByteCounts, oHeader));
+}
+
+} // namespace
+
+void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, const FileHeader& oHeader,
+                      const support::File& oSource, support::File& oTarget)
+{
+    std::vector<Placed> oSorted = Sort(oPages);
+    Space oSpace(oTarget.GetName(), oHeader.GetBytes(), oHeader.mbBigTiff ? INT64_MAX : UINT32_MAX);
+    for (Placed& oPlaced : oSorted)
+        PlaceDirectory(oPlaced, oHeader, oSpace);
+    for (auto oPlaced = oSorted.rbegin(); oPlaced != oSorted.rend(); ++oPlaced)
+        CopyBlocks(*oPlaced, oSource, oSpace, oTarget);
+    for (std::size_t nAt = 0; nAt < oSorted.size(); ++nAt)
+        WriteDirectory(oSorted[nAt], oHeader,
+                       nAt + 1 < oSorted.size() ? oSorted[nAt + 1].moPage.moDirectory.mnOffset : 0, oTarget);
+    unsigned char aHeader[FileHeader::BYTES] = {};
+    oHeader.Write(aHeader, oSorted.front().moPage.moDirectory.mnOffset);
+    oTarget.Write(0, aHeader, oHeader.GetBytes());
+}
+
+} // namespace krv::plugins::tif

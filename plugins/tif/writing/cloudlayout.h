@@ -1,0 +1,21 @@
+#pragma once
+
+#include "plugins/support/file.h"
+#include "plugins/tif/rawdirectory.h"
+#include "plugins/tif/writing/pagemodel.h"
+
+#include <memory>
+#include <vector>
+
+namespace krv::plugins::tif
+{
+
+// Writes a file anew so that it can be read in few requests over a network: the header, all directories with their
+// values, the image first and its levels from large to small, and then the blocks, those of the smallest level first
+// and in each page in their order. Blocks are copied as they are stored.
+//
+// oPages: of the chain, their tags in memory; the first is the image. Throws IOException.
+void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, const FileHeader& oHeader,
+                      const support::File& oSource, support::File& oTarget);
+
+} // namespace krv::plugins::tif
