@@ -10,6 +10,7 @@
 #include "datasources/iomanager/formatcapabilities.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/writer/basicwriter.h"
+#include "datasources/writer/overviewbuilder.h"
 #include "gobs/pct/pct.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
@@ -25,6 +26,7 @@
 #include <cctype>
 #include <filesystem>
 #include <memory>
+#include <sstream>
 #include <system_error>
 
 namespace krv::tool
@@ -293,6 +295,41 @@ void CopyBitmaps(const CopyPlan& oPlan, const Target& oTarget)
     }
 }
 
+// The one option that means the same to every format: a file laid out for reading over a network has its levels.
+bool WantsLevels(const std::string& options)
+{
+    std::istringstream oWords(options);
+    for (std::string word; oWords >> word;)
+    {
+        if (EqualNames(word, "LAYOUT=COG"))
+            return true;
+    }
+    return false;
+}
+
+// Mixing the indices of a colour table gives colours that mean nothing.
+void BuildLevels(const Target& oTarget)
+{
+    IRasterDataset& oRaster = oTarget.GetRaster();
+    const auto oLevels = GetDefaultLevels(oRaster.GetWidth(), oRaster.GetHeight());
+    const auto* const poTables = oTarget.Find<IPCTDataset>();
+    const bool bIndexed = poTables != nullptr && !poTables->GetPCTList().empty();
+    if (oLevels.empty())
+        return;
+    BasicWriter oWriter(&oRaster, {});
+    const std::uint64_t nPixelBytes = krv::gobs::BufferBytes(1, 1, oWriter.GetChansCount(), oWriter.GetDataType());
+    std::unique_ptr<Progress> poProgress;
+    OverviewOptions oOptions;
+    oOptions.moProgress = [&](std::uint64_t nDone, std::uint64_t nTotal)
+    {
+        if (poProgress == nullptr)
+            poProgress = std::make_unique<Progress>("overviews", nTotal * nPixelBytes);
+        poProgress->Advance(nDone * nPixelBytes - poProgress->GetDone());
+        return true;
+    };
+    BuildOverviews(oWriter, oLevels, bIndexed ? "mode" : "average", oOptions);
+}
+
 } // namespace
 
 void Convert(const CopyRequest& oRequest, const TargetForm& oForm)
@@ -306,6 +343,8 @@ void Convert(const CopyRequest& oRequest, const TargetForm& oForm)
     oTarget.Try("the metadata", [&] { oTarget.Get().WriteAuxiliaryData(oRecord); });
     CopyChannels(oPlan, oTarget);
     CopyBitmaps(oPlan, oTarget);
+    if (WantsLevels(oForm.options))
+        BuildLevels(oTarget);
     oTarget.Get().Close();
 }
 

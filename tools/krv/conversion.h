@@ -16,9 +16,10 @@ struct TargetForm
 };
 
 // Copies channels of one or several files of one size into a new file: pixels, metadata, geocoding, reference system,
-// colour tables and bitmaps. Warns of what the target's format cannot hold. A file of that name is replaced when the
-// copy is complete; on a failure, and when the user stops it, nothing changes. Throws UsageError for what makes no
-// sense, DataException when the target is one of the sources or no plain file, and what formats throw.
+// colour tables and bitmaps; with the option LAYOUT=COG levels are built too. Warns of what the target's format cannot
+// hold. A file of that name is replaced when the copy is complete; on a failure, and when the user stops it, nothing
+// changes. Throws UsageError for what makes no sense, DataException when the target is one of the sources or no plain
+// file, and what formats throw.
 void Convert(const CopyRequest& oRequest, const TargetForm& oForm);
 
 } // namespace krv::tool

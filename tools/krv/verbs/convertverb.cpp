@@ -80,7 +80,8 @@ void AddConvertVerb(CLI::App& oApp, Selection& oSelection)
     poVerb->add_option("--format", poOptions->form.format,
                        "The new file's format (`krv formats`); else by its extension, else TIF");
     poVerb->add_option("--options", poOptions->form.options,
-                       "\"KEY=VALUE ...\" of the format, such as \"COMPRESS=ZSTD BLOCKXSIZE=512\"");
+                       "\"KEY=VALUE ...\" of the format, such as \"COMPRESS=ZSTD BLOCKXSIZE=512\"; \"LAYOUT=COG\" of "
+                       "TIF also builds levels");
     poVerb->callback(
         [&oSelection, poOptions]
         {
