@@ -143,25 +143,24 @@ void GGLPolyRaster::AddEdge(const GDBVertex& oUpper, const GDBVertex& oLower, co
     const double nSlope = Slope(oUpper, oLower);
     const double nX = oUpper.x + (static_cast<double>(oRows.first) + 0.5 - oUpper.y) * nSlope;
     const auto [nLow, nHigh] = std::minmax({oUpper.x, oLower.x});
-    moEdges.emplace_back(static_cast<int>(oRows.first), static_cast<int>(oRows.last), std::clamp(nX, nLow, nHigh),
-                         nSlope);
+    const Edge oEdge(static_cast<int>(oRows.first), static_cast<int>(oRows.last), std::clamp(nX, nLow, nHigh), nSlope);
+    const double nEnd = oEdge.At(oEdge.lastRow);
+    mnLeft = std::min({mnLeft, oEdge.x, nEnd});
+    mnRight = std::max({mnRight, oEdge.x, nEnd});
+    mnFirstRow = std::min(mnFirstRow, oEdge.firstRow);
+    mnLastRow = std::max(mnLastRow, oEdge.lastRow);
+    moEdges.push_back(oEdge);
 }
 
 void GGLPolyRaster::Finish()
 {
     if (moEdges.empty())
-        return;
-    mnFirstRow = std::numeric_limits<int>::max();
-    mnLastRow = std::numeric_limits<int>::min();
-    mnLeft = GREATEST;
-    mnRight = -GREATEST;
-    for (const Edge& oEdge : moEdges)
     {
-        const double nEnd = oEdge.At(oEdge.lastRow);
-        mnFirstRow = std::min(mnFirstRow, oEdge.firstRow);
-        mnLastRow = std::max(mnLastRow, oEdge.lastRow);
-        mnLeft = std::min(mnLeft, std::min(oEdge.x, nEnd));
-        mnRight = std::max(mnRight, std::max(oEdge.x, nEnd));
+        mnFirstRow = 0;
+        mnLastRow = -1;
+        mnLeft = 0;
+        mnRight = 0;
+        return;
     }
     mnLeft = std::max(mnLeft, -GREATEST);
     mnRight = std::min(mnRight, GREATEST);

@@ -83,8 +83,8 @@ private:
     std::vector<Edge> moEdges;
     // For every bundle of edges the last row of them all; then for every bundle of these, and so on.
     std::vector<std::vector<int>> moLastRows;
-    int mnFirstRow = 0;
-    int mnLastRow = -1;
-    double mnLeft = 0;
-    double mnRight = 0;
+    int mnFirstRow = std::numeric_limits<int>::max();
+    int mnLastRow = std::numeric_limits<int>::min();
+    double mnLeft = std::numeric_limits<double>::max();
+    double mnRight = std::numeric_limits<double>::lowest();
 };

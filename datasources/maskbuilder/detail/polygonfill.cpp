@@ -29,13 +29,28 @@ std::int64_t Truncated(double nValue)
     return static_cast<std::int64_t>(std::clamp(nValue, -9e18, 9e18));
 }
 
+void Order(double& nLow, double& nHigh)
+{
+    const double nFirst = nLow;
+    nLow = std::min(nFirst, nHigh);
+    nHigh = std::max(nFirst, nHigh);
+}
+
 void SortCrossings(double* pFirst, std::size_t nCount)
 {
-    if (nCount > SHORT_LIST)
+    // Two and four without a branch: their order is anything but predictable.
+    if (nCount == 2)
+        return Order(pFirst[0], pFirst[1]);
+    if (nCount == 4)
     {
-        std::sort(pFirst, pFirst + nCount);
-        return;
+        Order(pFirst[0], pFirst[1]);
+        Order(pFirst[2], pFirst[3]);
+        Order(pFirst[0], pFirst[2]);
+        Order(pFirst[1], pFirst[3]);
+        return Order(pFirst[1], pFirst[2]);
     }
+    if (nCount > SHORT_LIST)
+        return std::sort(pFirst, pFirst + nCount);
     for (std::size_t i = 1; i < nCount; ++i)
     {
         const double nValue = pFirst[i];
