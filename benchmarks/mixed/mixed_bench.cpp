@@ -1,9 +1,10 @@
 // Measures reading a stack of images of different types as one type against reading the groups of one type by
 // themselves, tile by tile: through readers of the files, and from a DEMO file that the stack is written to.
-//     krv_bench_mixed FOLDER FILE FILE...
-// The files are images of one size; FOLDER takes the stack.
+//     krv_bench_mixed FOLDER [FILE FILE...]
+// The files are images of one size, made ones by default; FOLDER takes them and the stack.
 
 #include "benchmarks/support/measure.h"
+#include "benchmarks/support/scene.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
@@ -141,14 +142,18 @@ void MeasureFiles(IDataset& oDataset, const std::vector<Layer>& oLayers, const D
 
 int main(int nArguments, char** pArguments)
 {
-    if (nArguments < 4)
+    if (nArguments < 2)
     {
-        std::fprintf(stderr, "usage: krv_bench_mixed FOLDER FILE FILE...\n");
+        std::fprintf(stderr, "usage: krv_bench_mixed FOLDER [FILE FILE...]\n");
         return 2;
     }
     const std::string stack = std::string(pArguments[1]) + "/stack.demo";
     std::filesystem::create_directories(pArguments[1]);
-    const std::vector<Layer> oLayers = FindLayers({pArguments + 2, pArguments + nArguments});
+    std::vector<std::string> oFiles(pArguments + 2, pArguments + nArguments);
+    if (oFiles.empty())
+        for (const SceneKind& oKind : {SceneKind{"3x8U", 3, 8, false}, SceneKind{"1x16U", 1, 16, false}})
+            oFiles.push_back(MakeScene(pArguments[1], oKind, "deflate", 256, 2048).moPath);
+    const std::vector<Layer> oLayers = FindLayers(oFiles);
     WriteStack(stack, oLayers);
     const std::unique_ptr<IDataset> oDataset(DatasetManager::GetInstance()->Open(oLayers.front().moFile, eReadOnly));
     PrintHeading("Several types as one against the groups by themselves");
