@@ -59,8 +59,11 @@ std::string SystemErrorText(int nError)
     return strerror_r(nError, aText, sizeof(aText));
 }
 
-std::string MakeTemporaryName(const std::string& fileName)
+std::string MakeTemporaryName(const std::string& fileName, const Place& oPlace)
 {
+    struct stat oStatus = {};
+    if (::stat(fileName.c_str(), &oStatus) == 0 && !S_ISREG(oStatus.st_mode))
+        throw IOException(fileName, fileName + ": is not a plain file and is not replaced", oPlace);
     static std::atomic<unsigned int> nCounter = 0;
     const std::size_t nSlash = fileName.rfind('/');
     const std::size_t nBegin = nSlash == std::string::npos ? 0 : nSlash + 1;

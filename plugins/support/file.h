@@ -78,8 +78,9 @@ private:
 };
 
 // A name for what becomes fileName when it is whole: in the same folder, so that it can be renamed, of no length that a
-// folder does not take, and of this process alone.
-std::string MakeTemporaryName(const std::string& fileName);
+// folder does not take, and of this process alone. Throws IOException when a folder, a device or the like has the name:
+// renaming would put the file in its place.
+std::string MakeTemporaryName(const std::string& fileName, const Place& oPlace = Place::Current());
 
 // The text of an error number, in the C locale.
 std::string SystemErrorText(int nError);

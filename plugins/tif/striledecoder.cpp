@@ -78,6 +78,7 @@ void StrileDecoder::DecodeByLibrary(std::uint32_t nStrile, unsigned char* pRaw, 
 {
     CheckStream(nStrile, pRaw, nRaw);
     TiffHandle& oHandle = moPage.GetHandle();
+    oHandle.Forget();
     const int nDone = TIFFReadFromUserBuffer(oHandle.Get(), nStrile, pRaw, static_cast<tmsize_t>(nRaw), pTarget,
                                              static_cast<tmsize_t>(nBytes));
     const std::string message = oHandle.TakeMessage("its data are damaged");

@@ -7,7 +7,6 @@
 #include <cstdio>
 #include <cstring>
 #include <string_view>
-#include <utility>
 
 namespace krv::plugins::tif
 {
@@ -91,6 +90,7 @@ int TiffHandle::Client::OnError(TIFF*, void* pClient, const char*, const char* p
     char aText[512];
     std::vsnprintf(aText, sizeof(aText), pFormat, oArguments);
     static_cast<Client*>(pClient)->Note(aText);
+    static_cast<Client*>(pClient)->mbLostData = true;
     return 1;
 }
 
@@ -98,19 +98,21 @@ int TiffHandle::Client::OnError(TIFF*, void* pClient, const char*, const char* p
 int TiffHandle::Client::OnWarning(TIFF*, void* pClient, const char* pModule, const char* pFormat,
                                   va_list oArguments) noexcept
 {
-    Client& oClient = *static_cast<Client*>(pClient);
     const std::string_view module = pModule != nullptr ? pModule : "";
     if (module.starts_with("Fax") || module.starts_with("JPEG"))
-    {
-        oClient.mbLostData = true;
         OnError(nullptr, pClient, pModule, pFormat, oArguments);
-    }
     return 1;
 }
 
-bool TiffHandle::HasLostData()
+bool TiffHandle::HasLostData() const
 {
-    return std::exchange(mpoClient->mbLostData, false);
+    return mpoClient->mbLostData;
+}
+
+void TiffHandle::Forget()
+{
+    mpoClient->maMessage[0] = '\0';
+    mpoClient->mbLostData = false;
 }
 
 TiffHandle::TiffHandle(PeekReader& oReader, const FileHeader& oHeader, std::uint64_t nDirectory)
@@ -129,8 +131,7 @@ TiffHandle::TiffHandle(PeekReader& oReader, const FileHeader& oHeader, std::uint
                           &Client::Close, &Client::Size, &Client::Map, &Client::Unmap, poOptions.get());
     if (mpoTiff == nullptr)
         throw FileFormatException(fileName, fileName + ": " + TakeMessage("the TIFF directory cannot be read"));
-    mpoClient->maMessage[0] = '\0';
-    mpoClient->mbLostData = false;
+    Forget();
 }
 
 TiffHandle::~TiffHandle()

@@ -7,6 +7,7 @@
 
 #include <gtest/gtest.h>
 #include <png.h>
+#include <sys/stat.h>
 #include <tiffio.h>
 #include <zlib.h>
 
@@ -185,8 +186,12 @@ TEST(Command, ViewMakesMissingPixelsTransparent)
     EXPECT_EQ(oPixels[(50 * 100 + 50) * 4 + 3], 255);
     ASSERT_EQ(RunKrv({"view", SceneFolder() + "/pan.tif", target, "--size", "5000"}).code, 0);
     EXPECT_EQ(ReadPng(target, oPixels).width, 300U);
+    std::filesystem::remove(target);
     ExpectFailure(RunKrv({"view", SceneFolder() + "/pan.tif", oFolder.GetPath() + "/no/look.png"}), 1,
                   {"no/look.png", "No such file"});
+    ASSERT_EQ(mkfifo(target.c_str(), 0600), 0);
+    ExpectFailure(RunKrv({"view", SceneFolder() + "/pan.tif", target}), 1, {target, "not a regular file"});
+    EXPECT_TRUE(std::filesystem::is_fifo(target));
     ExpectFailure(RunKrv({"view", SceneFolder() + "/rgb.tif", target, "--channels", "1,2"}), 2, {"three"});
     EXPECT_EQ(std::distance(std::filesystem::directory_iterator(oFolder.GetPath()), {}), 1);
 }

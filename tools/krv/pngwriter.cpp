@@ -4,6 +4,7 @@
 
 #include <png.h>
 
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -26,6 +27,10 @@ class NewFile
 public:
     explicit NewFile(const std::string& name) : moName(name), moPart(name + "." + std::to_string(getpid()) + ".part")
     {
+        // Renaming would replace a device.
+        struct stat oStatus = {};
+        if (stat(name.c_str(), &oStatus) == 0 && !S_ISREG(oStatus.st_mode))
+            throw krv::IOException(name, "it cannot be written: it is not a regular file");
         mpFile = std::fopen(moPart.c_str(), "wb");
         if (mpFile == nullptr)
             Fail("it cannot be written");
