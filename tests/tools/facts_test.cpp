@@ -2,19 +2,15 @@
 
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/rasterrange.h"
+#include "tests/support/facts.h"
 #include "tests/tools/programrun.h"
 
 #include <gtest/gtest.h>
 #include <zlib.h>
 
-#include <bit>
 #include <cmath>
-#include <cstdlib>
-#include <cstring>
 #include <filesystem>
-#include <fstream>
 #include <map>
-#include <sstream>
 
 namespace krv::tool
 {
@@ -22,56 +18,12 @@ namespace krv::tool
 namespace
 {
 
+using krv::test::DataFolder;
+using krv::test::Facts;
 using krv::test::RunKrv;
+using krv::test::Split;
+using krv::test::ToHalf;
 using nlohmann::json;
-
-std::string DataFolder()
-{
-    const char* const pFolder = std::getenv("KRV_TEST_DATA");
-    return pFolder != nullptr ? pFolder : KRV_TEST_DATA;
-}
-
-std::vector<std::string> Split(const std::string& text, char nSeparator)
-{
-    std::vector<std::string> oParts;
-    std::stringstream oStream(text);
-    for (std::string part; std::getline(oStream, part, nSeparator);)
-        oParts.push_back(part);
-    return oParts;
-}
-
-// One file's row by column name; "-" stands for absent.
-class Facts
-{
-public:
-    Facts(const std::vector<std::string>& oNames, const std::vector<std::string>& oValues)
-    {
-        for (std::size_t i = 0; i < oNames.size(); ++i)
-            moValues[oNames[i]] = i < oValues.size() ? oValues[i] : "-";
-    }
-    const std::string& operator[](const std::string& name) const { return moValues.at(name); }
-    bool Has(const std::string& name) const { return (*this)[name] != "-"; }
-    std::vector<std::string> List(const std::string& name, char nSeparator = ';') const
-    {
-        return Has(name) ? Split((*this)[name], nSeparator) : std::vector<std::string>();
-    }
-    bool IsLossy() const { return (*this)["lossy"] == "yes"; }
-
-private:
-    std::map<std::string, std::string> moValues;
-};
-
-std::vector<Facts> ReadFacts()
-{
-    std::vector<Facts> oRows;
-    std::ifstream oStream(DataFolder() + "/FACTS.tsv");
-    std::string line;
-    std::getline(oStream, line);
-    const auto oNames = Split(line, '\t');
-    while (std::getline(oStream, line))
-        oRows.emplace_back(oNames, Split(line, '\t'));
-    return oRows;
-}
 
 std::string ExpectedType(const std::string& type)
 {
@@ -84,18 +36,6 @@ std::string ExpectedType(const std::string& type)
                                                           {"uint8(packed)", "8U"},  {"uint16(packed)", "16U"},
                                                           {"uint32(packed)", "32U"}};
     return TYPES.at(type);
-}
-
-// IEEE half precision of a value that came from one.
-std::uint16_t ToHalf(float nValue)
-{
-    const auto nBits = std::bit_cast<std::uint32_t>(nValue);
-    const std::uint32_t nSign = nBits >> 16U & 0x8000U, nExponent = nBits >> 23U & 255U, nFraction = nBits & 0x7FFFFFU;
-    if (nExponent == 255)
-        return static_cast<std::uint16_t>(nSign | 0x7C00U | nFraction >> 13U);
-    if (nExponent > 112)
-        return static_cast<std::uint16_t>(nSign | (nExponent - 112) << 10U | nFraction >> 13U);
-    return static_cast<std::uint16_t>(nExponent < 102 ? nSign : nSign | (nFraction | 0x800000U) >> (126 - nExponent));
 }
 
 std::string HalfChecksum(const std::string& file, unsigned int nChannel)
@@ -128,13 +68,11 @@ void CompareGeography(const Facts& oFacts, const json& oInfo)
     {
         EXPECT_TRUE(oInfo["crs"].is_null());
     }
-    const auto oTerms = oFacts.List("geotransform", ' ');
+    const auto oTerms = oFacts.Numbers("geotransform");
     ASSERT_EQ(oInfo["geocoding"].is_null(), oTerms.empty());
     for (std::size_t i = 0; i < oTerms.size(); ++i)
-    {
-        const double nTerm = std::stod(oTerms[i]);
-        EXPECT_NEAR(oInfo["geocoding"][i].get<double>(), nTerm, 1e-13 * std::fabs(nTerm) + 1e-15) << "term " << i;
-    }
+        EXPECT_NEAR(oInfo["geocoding"][i].get<double>(), oTerms[i], 1e-13 * std::fabs(oTerms[i]) + 1e-15)
+            << "term " << i;
 }
 
 // The levels that the reduced pages make: the larger page stays where two have one number.
@@ -166,7 +104,7 @@ void CompareLevels(const Facts& oFacts, const json& oInfo, const std::string& fi
         const json& oFound = oInfo["overviews"][i++];
         EXPECT_EQ(oFound["level"], nLevel);
         EXPECT_EQ(oFound["width"].dump() + " " + oFound["height"].dump(), oPage[0] + " " + oPage[1]);
-        if (oFacts.IsLossy() || oFacts["type"] == "float16")
+        if (oFacts.IsLossy() || oFacts.IsHalf())
             continue;
         const auto oRun = RunKrv({"checksum", file, "--json", "--level", std::to_string(nLevel)});
         ASSERT_EQ(oRun.code, 0) << oRun.errors;
@@ -209,8 +147,8 @@ void CompareChecksums(const Facts& oFacts, const std::string& file)
     ASSERT_EQ(oSums["channels"].size(), oExpected.size());
     for (std::size_t c = 0; c < oExpected.size() && !oFacts.IsLossy(); ++c)
     {
-        const std::string found = oFacts["type"] == "float16" ? HalfChecksum(file, static_cast<unsigned int>(c) + 1)
-                                                              : oSums["channels"][c]["crc32"].get<std::string>();
+        const std::string found = oFacts.IsHalf() ? HalfChecksum(file, static_cast<unsigned int>(c) + 1)
+                                                  : oSums["channels"][c]["crc32"].get<std::string>();
         EXPECT_EQ(found, oExpected[c]) << "channel " << c + 1;
     }
 }
@@ -255,14 +193,12 @@ void CompareStatistics(const Facts& oFacts, const std::string& file)
 
 TEST(RealFiles, AgreeWithTheTableOfFacts)
 {
-    if (!std::filesystem::exists(DataFolder() + "/FACTS.tsv"))
+    if (krv::test::GetFacts().empty())
         GTEST_SKIP() << "no folder of real files";
-    const auto oRows = ReadFacts();
-    ASSERT_FALSE(oRows.empty());
-    for (const Facts& oFacts : oRows)
+    for (const Facts& oFacts : krv::test::GetFacts())
     {
         SCOPED_TRACE(oFacts["file"]);
-        const std::string file = DataFolder() + "/" + oFacts["file"];
+        const std::string file = oFacts.GetPath();
         CompareInfo(oFacts, file);
         CompareChecksums(oFacts, file);
         CompareStatistics(oFacts, file);

@@ -10,16 +10,12 @@
 #include "datasources/reader/validitysource.h"
 #include "gobs/mask/mask.h"
 #include "gobs/raster/raster.h"
+#include "tests/support/facts.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
-#include <cstdlib>
-#include <filesystem>
-#include <fstream>
 #include <memory>
-#include <sstream>
 #include <string>
 #include <vector>
 
@@ -29,51 +25,8 @@ namespace krv::datasources
 namespace
 {
 
-std::string DataFolder()
-{
-    const char* const pFolder = std::getenv("KRV_TEST_DATA");
-    return pFolder != nullptr ? pFolder : KRV_TEST_DATA;
-}
-
-std::vector<std::string> Split(const std::string& text, char cSeparator)
-{
-    std::vector<std::string> oParts;
-    std::stringstream oStream(text);
-    for (std::string part; std::getline(oStream, part, cSeparator);)
-        oParts.push_back(part);
-    return oParts;
-}
-
-struct Fact
-{
-    std::string moFile;
-    std::string moText;
-    std::vector<std::string> moCounts; // one a channel
-};
-
-std::size_t Column(const std::vector<std::string>& oNames, const std::string& name)
-{
-    return static_cast<std::size_t>(std::find(oNames.begin(), oNames.end(), name) - oNames.begin());
-}
-
-// The files that have a no-data value and a count for it.
-std::vector<Fact> ReadFacts()
-{
-    std::ifstream oStream(DataFolder() + "/FACTS.tsv");
-    std::string line;
-    std::getline(oStream, line);
-    const auto oNames = Split(line, '\t');
-    const std::size_t nText = Column(oNames, "no_data");
-    const std::size_t nCount = Column(oNames, "band_no_data_count");
-    std::vector<Fact> oFacts;
-    while (std::getline(oStream, line))
-    {
-        const auto oValues = Split(line, '\t');
-        if (oValues.size() > nCount && oValues[nText] != "-" && oValues[nCount] != "-")
-            oFacts.push_back({DataFolder() + "/" + oValues[0], oValues[nText], Split(oValues[nCount], ';')});
-    }
-    return oFacts;
-}
+using krv::test::DataFolder;
+using krv::test::Facts;
 
 std::uint64_t CountMasked(const std::string& file, unsigned int nChannel, const krv::gobs::IMaskBuilder& oBuilder)
 {
@@ -91,27 +44,29 @@ class RealNoData : public testing::Test
 protected:
     void SetUp() override
     {
-        if (!std::filesystem::exists(DataFolder() + "/FACTS.tsv"))
+        if (krv::test::GetFacts().empty())
             GTEST_SKIP() << "there are no real files in " << DataFolder();
     }
 };
 
 TEST_F(RealNoData, MaskCountsAgreeWithTheFacts)
 {
-    const auto oFacts = ReadFacts();
-    ASSERT_GT(oFacts.size(), 20u);
-    for (const Fact& oFact : oFacts)
+    unsigned int nCounted = 0;
+    for (const Facts& oFacts : krv::test::GetFacts())
     {
-        SCOPED_TRACE(oFact.moFile);
-        for (std::size_t n = 0; n < oFact.moCounts.size(); ++n)
+        const auto oCounts = oFacts.List("band_no_data_count");
+        SCOPED_TRACE(oFacts["file"]);
+        for (std::size_t n = 0; n < oCounts.size() && oFacts.Has("no_data"); ++n)
         {
             const auto nChannel = static_cast<unsigned int>(n + 1);
-            const BasicReader oReader(oFact.moFile, {nChannel});
+            const std::uint64_t nExpected = std::stoull(oCounts[n]);
+            ++nCounted;
+            const BasicReader oReader(oFacts.GetPath(), {nChannel});
             const AuxiliaryData oMetadata = oReader.GetAuxiliaryData();
-            EXPECT_EQ(GetNoDataText(oMetadata, 1), oFact.moText);
+            EXPECT_EQ(GetNoDataText(oMetadata, 1), oFacts["no_data"]);
             const std::unique_ptr<krv::gobs::IMaskBuilder> oTyped(
                 GetTypedNoDataMaskBuilder(oMetadata, krv::gobs::eAnyChannel));
-            EXPECT_EQ(CountMasked(oFact.moFile, nChannel, *oTyped), std::stoull(oFact.moCounts[n]));
+            EXPECT_EQ(CountMasked(oFacts.GetPath(), nChannel, *oTyped), nExpected);
             if (GetTypedNoData(oMetadata, 1)->IsNaN())
             {
                 EXPECT_THROW(GetNoDataMaskBuilder(oMetadata, krv::gobs::eAnyChannel), krv::Exception);
@@ -119,9 +74,10 @@ TEST_F(RealNoData, MaskCountsAgreeWithTheFacts)
             }
             const std::unique_ptr<krv::gobs::IMaskBuilder> oPlain(
                 GetNoDataMaskBuilder(oMetadata, krv::gobs::eAnyChannel));
-            EXPECT_EQ(CountMasked(oFact.moFile, nChannel, *oPlain), std::stoull(oFact.moCounts[n]));
+            EXPECT_EQ(CountMasked(oFacts.GetPath(), nChannel, *oPlain), nExpected);
         }
     }
+    EXPECT_GT(nCounted, 20U);
 }
 
 TEST_F(RealNoData, ValidityAddsBitmapsAndAlpha)

@@ -59,16 +59,6 @@ TEST(Bits, UnpacksEveryWidth)
         }
 }
 
-TEST(Bits, ContainersAreTheNextWords)
-{
-    EXPECT_EQ(1U, GetContainerBytes(1));
-    EXPECT_EQ(1U, GetContainerBytes(8));
-    EXPECT_EQ(2U, GetContainerBytes(9));
-    EXPECT_EQ(4U, GetContainerBytes(17));
-    EXPECT_EQ(4U, GetContainerBytes(32));
-    EXPECT_EQ(8U, GetContainerBytes(33));
-}
-
 TEST(Bits, UnpacksThreeBytes)
 {
     for (std::size_t nCount = 0; nCount < 40; ++nCount)

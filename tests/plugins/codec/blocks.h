@@ -75,50 +75,25 @@ inline Bytes MakeData(std::mt19937& oRandom, unsigned int nKind, std::size_t nCo
     return oBytes;
 }
 
-// What a strip of a file written by libtiff is made of.
-struct StripKind
-{
-    std::uint16_t mnCompression = COMPRESSION_NONE;
-    std::uint16_t mnPredictor = PREDICTOR_NONE;
-    std::uint16_t mnFormat = SAMPLEFORMAT_UINT;
-    std::uint16_t mnSampleBytes = 1;
-    std::uint16_t mnChannels = 1;
-    std::uint32_t mnWidth = 1;
-    std::uint32_t mnRows = 1;
-    const char* moOrder = ""; // "b" and "l" for a file of big and of little endian
-};
-
-// The one stored strip of an image that libtiff coded. decoded: takes what libtiff itself reads out of it.
-inline Bytes MakeStrip(const Bytes& oImage, const StripKind& oKind, Bytes* decoded = nullptr)
+// The one stored strip of a row of bytes that libtiff coded.
+inline Bytes MakeStrip(const Bytes& oRow, std::uint16_t nCompression)
 {
     MemoryTiff oMemory;
     {
-        const auto oFile = oMemory.Open((std::string("w") + oKind.moOrder).c_str());
+        const auto oFile = oMemory.Open("w");
         TIFF* tif = oFile.get();
-        TIFFSetField(tif, TIFFTAG_IMAGEWIDTH, oKind.mnWidth);
-        TIFFSetField(tif, TIFFTAG_IMAGELENGTH, oKind.mnRows);
-        TIFFSetField(tif, TIFFTAG_ROWSPERSTRIP, oKind.mnRows);
-        TIFFSetField(tif, TIFFTAG_SAMPLESPERPIXEL, oKind.mnChannels);
-        TIFFSetField(tif, TIFFTAG_BITSPERSAMPLE, oKind.mnSampleBytes * 8);
-        TIFFSetField(tif, TIFFTAG_SAMPLEFORMAT, oKind.mnFormat);
-        TIFFSetField(tif, TIFFTAG_PLANARCONFIG, PLANARCONFIG_CONTIG);
+        TIFFSetField(tif, TIFFTAG_IMAGEWIDTH, static_cast<std::uint32_t>(oRow.size()));
+        TIFFSetField(tif, TIFFTAG_IMAGELENGTH, 1);
+        TIFFSetField(tif, TIFFTAG_ROWSPERSTRIP, 1);
+        TIFFSetField(tif, TIFFTAG_BITSPERSAMPLE, 8);
         TIFFSetField(tif, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
-        TIFFSetField(tif, TIFFTAG_COMPRESSION, oKind.mnCompression);
-        if (oKind.mnPredictor != PREDICTOR_NONE)
-            TIFFSetField(tif, TIFFTAG_PREDICTOR, oKind.mnPredictor);
-        Bytes oCopy = oImage; // libtiff works in its argument
+        TIFFSetField(tif, TIFFTAG_COMPRESSION, nCompression);
+        Bytes oCopy = oRow; // libtiff works in its argument
         TIFFWriteEncodedStrip(tif, 0, oCopy.data(), static_cast<tmsize_t>(oCopy.size()));
     }
-    TIFFErrorHandler oQuiet = TIFFSetWarningHandler(nullptr);
     const auto oFile = oMemory.Open("r");
-    TIFFSetWarningHandler(oQuiet);
     Bytes oStrip(TIFFGetStrileByteCount(oFile.get(), 0));
     TIFFReadRawStrip(oFile.get(), 0, oStrip.data(), static_cast<tmsize_t>(oStrip.size()));
-    if (decoded != nullptr)
-    {
-        decoded->resize(oImage.size());
-        TIFFReadEncodedStrip(oFile.get(), 0, decoded->data(), static_cast<tmsize_t>(decoded->size()));
-    }
     return oStrip;
 }
 

@@ -122,18 +122,4 @@ TEST(Interleave, PlanesComeTogether)
     }
 }
 
-TEST(Interleave, NothingMovesWhereThereIsNothing)
-{
-    const std::size_t nChannel = 0;
-    for (const PixelArea& oArea : {PixelArea{0, 5, 2}, PixelArea{5, 0, 2}})
-    {
-        const unsigned char* plane = nullptr;
-        GatherChannels(nullptr, 0, 3, nullptr, 0, &nChannel, 1, oArea);
-        PlaceChannel(nullptr, 0, nullptr, 0, 1, 3, oArea);
-        ExtractChannel(nullptr, 0, 1, 3, nullptr, 0, oArea);
-        InterleavePlanes(&plane, 0, nullptr, 0, 1, oArea);
-        CopyRows(nullptr, 0, nullptr, 0, oArea.mnWidth, oArea.mnRows);
-    }
-}
-
 } // namespace

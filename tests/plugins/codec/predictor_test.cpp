@@ -1,12 +1,9 @@
 #include "plugins/support/codec/predictor.h"
 
-#include "plugins/support/codec/bits.h"
-#include "plugins/support/codec/deflatedecoder.h"
 #include "tests/plugins/codec/blocks.h"
 
 #include <gtest/gtest.h>
 
-#include <bit>
 #include <cstring>
 
 namespace
@@ -146,50 +143,6 @@ TEST(Predictor, FloatingPointPlanesComeAndGo)
                    [&](auto... oPlaces) { ApplyFloatingPoint(oPlaces..., oCase.moShape, oScratch); });
         if (HasFatalFailure())
             return;
-    }
-}
-
-TEST(Predictor, LeftPartOfARowStandsForItself)
-{
-    const Case oCase = MakeCase(3, {2}, &Difference);
-    BlockShape oPart = oCase.moShape;
-    oPart.mnWidth = (oPart.mnWidth + 1) / 2;
-    Exact oResult(oPart.GetRowBytes());
-    oPart.mnRows = 1;
-    UndoHorizontal(oCase.moCoded[0].data(), 0, oResult.data(), 0, oPart);
-    EXPECT_EQ(0, std::memcmp(oCase.moPlain[0].data(), oResult.data(), oResult.size()));
-}
-
-// In files of both byte orders; libtiff does not read back all that it writes in the other one.
-TEST(Predictor, UndoesAsLibtiffDoes)
-{
-    DeflateDecoder oDecoder;
-    std::vector<unsigned char> oScratch;
-    for (unsigned int nSeed = 0; nSeed < 200; ++nSeed)
-    {
-        std::mt19937 oRandom(nSeed);
-        krv::test::StripKind oKind;
-        const bool bReal = nSeed % 2 == 1, bSwapped = nSeed % 4 > 1;
-        oKind.mnCompression = COMPRESSION_ADOBE_DEFLATE;
-        oKind.mnPredictor = bReal ? PREDICTOR_FLOATINGPOINT : PREDICTOR_HORIZONTAL;
-        oKind.mnFormat = bReal ? SAMPLEFORMAT_IEEEFP : SAMPLEFORMAT_UINT;
-        oKind.mnSampleBytes =
-            static_cast<std::uint16_t>(bReal ? std::array{2, 3, 4, 8}[oRandom() % 4] : 1 << oRandom() % 4);
-        oKind.mnChannels = static_cast<std::uint16_t>(1 + oRandom() % 5);
-        oKind.mnWidth = 1 + static_cast<std::uint32_t>(oRandom() % 50);
-        oKind.mnRows = 1 + static_cast<std::uint32_t>(oRandom() % 5);
-        oKind.moOrder = bSwapped ? "b" : "l";
-        const BlockShape oShape{oKind.mnWidth, oKind.mnRows, oKind.mnChannels, oKind.mnSampleBytes};
-        const std::size_t nPitch = oShape.GetRowBytes(), nBytes = nPitch * oShape.mnRows;
-        Bytes oImage;
-        Exact oStrip(krv::test::MakeStrip(krv::test::RandomBytes(oRandom, nBytes), oKind, &oImage)), oResult(nBytes);
-        ASSERT_TRUE(oDecoder.Decode(oStrip.data(), oStrip.size(), oResult.data(), nBytes).IsDone());
-        if (bReal)
-            UndoFloatingPoint(oResult.data(), nPitch, oResult.data(), nPitch, oShape, oScratch);
-        else
-            UndoHorizontal(oResult.data(), nPitch, oResult.data(), nPitch, oShape,
-                           bSwapped ? SampleOrder::eSwapped : SampleOrder::eNative);
-        ASSERT_TRUE(oImage == oResult.ToBytes()) << "seed " << nSeed;
     }
 }
 

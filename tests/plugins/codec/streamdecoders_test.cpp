@@ -139,21 +139,6 @@ TYPED_TEST(StreamDecoder, ChangedStreamsAreNotTakenForGood)
     EXPECT_LT(nWrong, 12U);
 }
 
-TYPED_TEST(StreamDecoder, NoiseIsRefused)
-{
-    for (unsigned int nSeed = 0; nSeed < 500; ++nSeed)
-    {
-        std::mt19937 oRandom(nSeed);
-        Bytes oStream = krv::test::RandomBytes(oRandom, oRandom() % 300);
-        if (oRandom() % 2 == 0) // something that begins well
-        {
-            const Bytes oGood = TypeParam::Encode(oStream);
-            oStream.insert(oStream.begin(), oGood.begin(), oGood.begin() + 6);
-        }
-        ASSERT_FALSE(this->Decode(oStream, 5000).IsDone()) << "seed " << nSeed;
-    }
-}
-
 TYPED_TEST(StreamDecoder, ADecoderGoesOnAfterAFault)
 {
     const Bytes oData = this->MakeData(4);

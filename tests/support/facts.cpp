@@ -1,0 +1,79 @@
+#include "tests/support/facts.h"
+
+#include <bit>
+#include <cstdlib>
+#include <fstream>
+#include <sstream>
+
+namespace krv::test
+{
+
+namespace
+{
+
+std::vector<Facts> ReadFacts()
+{
+    std::vector<Facts> oRows;
+    std::ifstream oStream(DataFolder() + "/FACTS.tsv");
+    std::string line;
+    std::getline(oStream, line);
+    const auto oNames = Split(line, '\t');
+    while (std::getline(oStream, line))
+        oRows.emplace_back(oNames, Split(line, '\t'));
+    return oRows;
+}
+
+} // namespace
+
+std::string DataFolder()
+{
+    const char* const pFolder = std::getenv("KRV_TEST_DATA");
+    return pFolder != nullptr ? pFolder : KRV_TEST_DATA;
+}
+
+std::vector<std::string> Split(const std::string& text, char nSeparator)
+{
+    std::vector<std::string> oParts;
+    std::istringstream oStream(text);
+    for (std::string part; std::getline(oStream, part, nSeparator);)
+        oParts.push_back(part);
+    return oParts;
+}
+
+Facts::Facts(const std::vector<std::string>& oNames, const std::vector<std::string>& oValues)
+{
+    for (std::size_t i = 0; i < oNames.size(); ++i)
+        moValues[oNames[i]] = i < oValues.size() ? oValues[i] : "-";
+}
+
+std::vector<std::string> Facts::List(const std::string& name, char nSeparator) const
+{
+    return Has(name) ? Split((*this)[name], nSeparator) : std::vector<std::string>();
+}
+
+std::vector<double> Facts::Numbers(const std::string& name) const
+{
+    std::vector<double> oNumbers;
+    for (const std::string& number : List(name, ' '))
+        oNumbers.push_back(std::stod(number));
+    return oNumbers;
+}
+
+const std::vector<Facts>& GetFacts()
+{
+    static const std::vector<Facts> ROWS = ReadFacts();
+    return ROWS;
+}
+
+std::uint16_t ToHalf(float nValue)
+{
+    const auto nBits = std::bit_cast<std::uint32_t>(nValue);
+    const std::uint32_t nSign = nBits >> 16U & 0x8000U, nExponent = nBits >> 23U & 255U, nFraction = nBits & 0x7FFFFFU;
+    if (nExponent == 255)
+        return static_cast<std::uint16_t>(nSign | 0x7C00U | nFraction >> 13U);
+    if (nExponent > 112)
+        return static_cast<std::uint16_t>(nSign | (nExponent - 112) << 10U | nFraction >> 13U);
+    return static_cast<std::uint16_t>(nExponent < 102 ? nSign : nSign | (nFraction | 0x800000U) >> (126 - nExponent));
+}
+
+} // namespace krv::test
