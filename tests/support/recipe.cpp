@@ -22,27 +22,6 @@ void Append(std::string& oBytes, T nValue, std::size_t nBytes = sizeof(T))
     oBytes.append(reinterpret_cast<const char*>(&nValue), nBytes);
 }
 
-// The index on a line that stands for one outside it, found by walking back one reflection or step at a time; negative
-// for a constant.
-long long Fold(long long nIndex, long long nLength, eMarginBehaviour eBehaviour)
-{
-    while (nIndex < 0 || nIndex >= nLength)
-    {
-        const bool bBefore = nIndex < 0;
-        if (eBehaviour == eConstant)
-            return -1;
-        if (eBehaviour == eReplicate || nLength == 1)
-            return bBefore ? 0 : nLength - 1;
-        if (eBehaviour == eMirror)
-            nIndex = bBefore ? -1 - nIndex : 2 * nLength - 1 - nIndex;
-        else if (eBehaviour == eMirror101)
-            nIndex = bBefore ? -nIndex : 2 * nLength - 2 - nIndex;
-        else
-            nIndex += bBefore ? nLength : -nLength;
-    }
-    return nIndex;
-}
-
 // One direction of a window with margins: the pixels of the buffer that are read, and where the buffer starts.
 struct Span
 {
@@ -65,12 +44,31 @@ struct Span
 
     long long Source(long long nIndex, eMarginBehaviour eBehaviour) const
     {
-        const long long nFolded = Fold(nIndex - mnFirst, mnCount, eBehaviour);
+        const long long nFolded = FoldNaively(nIndex - mnFirst, mnCount, eBehaviour);
         return nFolded < 0 ? -1 : mnStart + mnFirst + nFolded;
     }
 };
 
 } // namespace
+
+long long FoldNaively(long long nIndex, long long nLength, eMarginBehaviour eBehaviour)
+{
+    while (nIndex < 0 || nIndex >= nLength)
+    {
+        const bool bBefore = nIndex < 0;
+        if (eBehaviour == eConstant || eBehaviour == eNoData)
+            return -1;
+        if (eBehaviour == eReplicate || nLength == 1)
+            return bBefore ? 0 : nLength - 1;
+        if (eBehaviour == eMirror)
+            nIndex = bBefore ? -1 - nIndex : 2 * nLength - 1 - nIndex;
+        else if (eBehaviour == eMirror101)
+            nIndex = bBefore ? -nIndex : 2 * nLength - 2 - nIndex;
+        else
+            nIndex += bBefore ? nLength : -nLength;
+    }
+    return nIndex;
+}
 
 void AppendRecipeValue(std::string& oBytes, const krv::gobs::DataType& oType, unsigned int nChannel, unsigned int nX,
                        unsigned int nY)

@@ -18,6 +18,10 @@ void AppendRecipeValue(std::string& oBytes, const krv::gobs::DataType& oType, un
 std::string RecipeImage(unsigned int nWidth, unsigned int nHeight, const std::vector<unsigned int>& oChannels,
                         const krv::gobs::DataType& oType);
 
+// The index on a line that stands for one outside it, found by walking back one reflection or step at a time; negative
+// for a constant.
+long long FoldNaively(long long nIndex, long long nLength, eMarginBehaviour eBehaviour);
+
 // A whole image in memory, the reference of every comparison; naive on purpose: one pixel at a time.
 struct ReferenceImage
 {

@@ -1,3 +1,4 @@
+#include "tests/support/tempfolder.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/xml/limits.h"
 #include "toolkit/xml/xmldocument.h"
@@ -13,13 +14,10 @@
 #include <xalanc/XalanDOM/XalanDocument.hpp>
 #include <xercesc/sax/SAXParseException.hpp>
 
-#include <filesystem>
-#include <fstream>
 #include <optional>
 #include <thread>
 
 #include <sys/stat.h>
-#include <unistd.h>
 
 using krv::xml::Element;
 using krv::xml::ParseTree;
@@ -27,27 +25,6 @@ using ::testing::HasSubstr;
 
 namespace
 {
-
-class TemporaryFolder
-{
-public:
-    TemporaryFolder()
-    {
-        std::string name = (std::filesystem::temp_directory_path() / "krvxmlXXXXXX").string();
-        moPath = ::mkdtemp(name.data());
-    }
-    ~TemporaryFolder() { std::filesystem::remove_all(moPath); }
-
-    std::string Write(const std::string& name, const std::string& text) const
-    {
-        std::ofstream(moPath / name, std::ios::binary) << text;
-        return (moPath / name).string();
-    }
-    std::string Path(const std::string& name) const { return (moPath / name).string(); }
-
-private:
-    std::filesystem::path moPath;
-};
 
 std::string NestedXml(std::size_t nDepth)
 {
@@ -150,7 +127,7 @@ TEST(XmlTranscode, ReplacesWhatIsNotValid)
 
 TEST(XmlDocument, AnswersXPathsAfterMoving)
 {
-    const TemporaryFolder oFolder;
+    const krv::test::TempFolder oFolder;
     const std::string file =
         oFolder.Write("form\xC3\xA4t.xml", "<?xml version=\"1.0\"?>\n<Format><Object> tif </Object>"
                                            "<Capabilities><Dataset><SupportsCreate/></Dataset>"
@@ -164,14 +141,14 @@ TEST(XmlDocument, AnswersXPathsAfterMoving)
 
 TEST(XmlDocument, FailsWithTheParsersExceptionAndPrintsNothing)
 {
-    const TemporaryFolder oFolder;
-    ASSERT_EQ(::mkfifo(oFolder.Path("pipe.xml").c_str(), 0600), 0);
+    const krv::test::TempFolder oFolder;
+    ASSERT_EQ(::mkfifo(oFolder.File("pipe.xml").c_str(), 0600), 0);
     ::testing::internal::CaptureStderr();
     ::testing::internal::CaptureStdout();
-    EXPECT_THAT(ParseFileError(oFolder.Path("missing.xml")),
+    EXPECT_THAT(ParseFileError(oFolder.File("missing.xml")),
                 HasSubstr("missing.xml: The XML file cannot be read: No such"));
-    EXPECT_THAT(ParseFileError(oFolder.Path("")), HasSubstr("not a regular file"));
-    EXPECT_THAT(ParseFileError(oFolder.Path("pipe.xml")), HasSubstr("not a regular file"));
+    EXPECT_THAT(ParseFileError(oFolder.File("")), HasSubstr("not a regular file"));
+    EXPECT_THAT(ParseFileError(oFolder.File("pipe.xml")), HasSubstr("not a regular file"));
     EXPECT_THAT(ParseFileError(oFolder.Write("bad.xml", "<a>\n<b></a>")), HasSubstr("bad.xml:2:"));
     EXPECT_THAT(ParseFileError(oFolder.Write("empty.xml", "")), HasSubstr("empty.xml"));
     EXPECT_THAT(ParseFileError(oFolder.Write("deep.xml", NestedXml(100000))), HasSubstr("nested"));
@@ -199,7 +176,7 @@ TEST(XmlDocument, ExceptionOutlivesXmlSupport)
 
 TEST(XmlDocument, ReadsNothingOutsideAndDefinesNoEntities)
 {
-    const TemporaryFolder oFolder;
+    const krv::test::TempFolder oFolder;
     const std::string secret = oFolder.Write("secret.txt", "secret");
     const std::string external = "<!DOCTYPE a [<!ENTITY x SYSTEM \"" + secret + "\">]><a>&x;</a>";
     const std::string bomb = "<!DOCTYPE a [<!ENTITY b \"ha\"><!ENTITY c \"&b;&b;\">]><a>&c;</a>";

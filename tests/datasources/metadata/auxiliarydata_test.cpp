@@ -30,52 +30,30 @@ struct ChannelOperation
     std::function<void(AuxiliaryData&, unsigned int)> moCall;
 };
 
+// A call whose last argument is the channel.
+template <class Method, class... Arguments>
+ChannelOperation Operation(const char* pName, Method pMethod, const Arguments&... oArguments)
+{
+    return {pName, [=](AuxiliaryData& oData, unsigned int nChannel)
+            {
+                (oData.*pMethod)(oArguments..., nChannel);
+            }};
+}
+
 std::vector<ChannelOperation> ChannelOperations()
 {
-    static const MetadataMap MAP = {{"k", "v"}};
-    return {{"GetChanMetadata",
-             [](AuxiliaryData& o, unsigned int n)
+    using Data = AuxiliaryData;
+    return {Operation("GetChanMetadata", &Data::GetChanMetadata),
+            Operation("GetChanMetadataValue", &Data::GetChanMetadataValue, "k"),
+            Operation("GetChannelDescription", &Data::GetChannelDescription),
+            Operation("GetChanOverviewMetadata", &Data::GetChanOverviewMetadata),
+            Operation("SetChanMetadata", &Data::SetChanMetadata, MetadataMap{{"k", "v"}}),
+            Operation("SetChanMetadataValue", &Data::SetChanMetadataValue, "k", "v"),
+            Operation("RemoveChanMetadataValue", &Data::RemoveChanMetadataValue, "k"),
+            Operation("SetChannelDescription", &Data::SetChannelDescription, "d"),
+            {"AppendChanMetadata", [](Data& oData, unsigned int nChannel)
              {
-                 o.GetChanMetadata(n);
-             }},
-            {"GetChanMetadataValue",
-             [](AuxiliaryData& o, unsigned int n)
-             {
-                 o.GetChanMetadataValue("k", n);
-             }},
-            {"GetChannelDescription",
-             [](AuxiliaryData& o, unsigned int n)
-             {
-                 o.GetChannelDescription(n);
-             }},
-            {"GetChanOverviewMetadata",
-             [](AuxiliaryData& o, unsigned int n)
-             {
-                 o.GetChanOverviewMetadata(n);
-             }},
-            {"SetChanMetadata",
-             [](AuxiliaryData& o, unsigned int n)
-             {
-                 o.SetChanMetadata(MAP, n);
-             }},
-            {"SetChanMetadataValue",
-             [](AuxiliaryData& o, unsigned int n)
-             {
-                 o.SetChanMetadataValue("k", "v", n);
-             }},
-            {"RemoveChanMetadataValue",
-             [](AuxiliaryData& o, unsigned int n)
-             {
-                 o.RemoveChanMetadataValue("k", n);
-             }},
-            {"AppendChanMetadata",
-             [](AuxiliaryData& o, unsigned int n)
-             {
-                 o.AppendChanMetadata(MAP, n, true);
-             }},
-            {"SetChannelDescription", [](AuxiliaryData& o, unsigned int n)
-             {
-                 o.SetChannelDescription("d", n);
+                 oData.AppendChanMetadata({{"k", "v"}}, nChannel, true);
              }}};
 }
 

@@ -34,23 +34,18 @@ protected:
         {
             return dynamic_cast<Interface*>(mpoOpen.get());
         };
+        const auto FromFile = [this](const auto&... oArguments)
+        {
+            return [=, this]
+            {
+                return std::make_unique<BasicReader>(moFile, oArguments...);
+            };
+        };
         return {
-            {"file", [this] { return std::make_unique<BasicReader>(moFile); }, true},
-            {"file and channels",
-             [this]
-             {
-                 return std::make_unique<BasicReader>(moFile, Channels{3, 1, 2});
-             }},
-            {"file and no channels",
-             [this]
-             {
-                 return std::make_unique<BasicReader>(moFile, Channels{});
-             }},
-            {"file and filter",
-             [this]
-             {
-                 return std::make_unique<BasicReader>(moFile, moFilter);
-             }},
+            {"file", FromFile(), true},
+            {"file and channels", FromFile(Channels{3, 1, 2})},
+            {"file and no channels", FromFile(Channels{})},
+            {"file and filter", FromFile(moFilter)},
             {"bitmaps",
              [=]
              {

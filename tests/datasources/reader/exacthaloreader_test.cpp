@@ -17,25 +17,6 @@ using krv::datasources::ExactHaloReader;
 class ExactHaloReaderTest : public ReaderTest
 {
 protected:
-    // The index that stands for nIndex, walked step by step; -1 for the outside value.
-    static long long Walk(long long nIndex, long long nLength, eMarginBehaviour eBehaviour)
-    {
-        if (eBehaviour == eReplicate)
-            return nIndex < 0 ? 0 : nIndex >= nLength ? nLength - 1 : nIndex;
-        while (nIndex < 0 || nIndex >= nLength)
-        {
-            if (eBehaviour == eWrap)
-                nIndex += nIndex < 0 ? nLength : -nLength;
-            else if (eBehaviour == eMirror)
-                nIndex = nIndex < 0 ? -1 - nIndex : 2 * nLength - 1 - nIndex;
-            else if (eBehaviour == eMirror101)
-                nIndex = nLength == 1 ? 0 : nIndex < 0 ? -nIndex : 2 * nLength - 2 - nIndex;
-            else
-                return -1;
-        }
-        return nIndex;
-    }
-
     // A crop of the whole image extended beyond its borders, one pixel at a time.
     static std::string Crop(const ReferenceImage& oImage, long long nLeft, long long nTop, unsigned int nWidth,
                             unsigned int nHeight, eMarginBehaviour eBehaviour, const std::string& outside)
@@ -44,8 +25,8 @@ protected:
         for (unsigned int nY = 0; nY < nHeight; ++nY)
             for (unsigned int nX = 0; nX < nWidth; ++nX)
             {
-                const long long nColumn = Walk(nLeft + nX, oImage.mnWidth, eBehaviour);
-                const long long nRow = Walk(nTop + nY, oImage.mnHeight, eBehaviour);
+                const long long nColumn = FoldNaively(nLeft + nX, oImage.mnWidth, eBehaviour);
+                const long long nRow = FoldNaively(nTop + nY, oImage.mnHeight, eBehaviour);
                 crop += nColumn < 0 || nRow < 0 ? outside : oImage.Pixel(nColumn, nRow);
             }
         return crop;

@@ -280,60 +280,37 @@ TEST(GeoKeys, EveryProjectionMethodHasItsOriginInTheRightPlace)
         const char* name;
         double latitude;
         std::map<int, double> numbers;
-        int latitudeKey = ProjNatOriginLatGeoKey;
-        int longitudeKey = ProjNatOriginLongGeoKey;
+        std::pair<int, int> origin = {ProjNatOriginLatGeoKey, ProjNatOriginLongGeoKey};
     };
+    const std::pair<int, int> CENTER = {ProjCenterLatGeoKey, ProjCenterLongGeoKey};
+    const std::pair<int, int> FALSE_ORIGIN = {ProjFalseOriginLatGeoKey, ProjFalseOriginLongGeoKey};
+    const std::pair<int, int> POLE = {ProjNatOriginLatGeoKey, ProjStraightVertPoleLongGeoKey};
     const std::map<int, double> PARALLELS = {{ProjStdParallel1GeoKey, 45}, {ProjStdParallel2GeoKey, 55}};
     const std::map<int, double> AZIMUTHS = {{ProjAzimuthAngleGeoKey, 30}, {ProjRectifiedGridAngleGeoKey, 30}};
+    const std::map<int, double> AZIMUTH_19 = {{ProjAzimuthAngleGeoKey, 18.9}};
+    const std::map<int, double> SCALE = {{ProjScaleAtNatOriginGeoKey, 0.994}};
+    const std::map<int, double> PARALLEL = {{ProjStdParallel1GeoKey, 30}};
     const std::map<int, double> NO_OFFSET = {{ProjFalseEastingGeoKey, 0}, {ProjFalseNorthingGeoKey, 0}};
     const std::map<int, double> NEW_ZEALAND = {{ProjFalseEastingGeoKey, 2510000}, {ProjFalseNorthingGeoKey, 6023150}};
     const Case CASES[] = {
         {CT_TransverseMercator, "Transverse Mercator", 40, {}},
-        {CT_ObliqueMercator, "Hotine Oblique Mercator (variant A)", FREE, AZIMUTHS, ProjCenterLatGeoKey,
-         ProjCenterLongGeoKey},
-        {CT_HotineObliqueMercatorAzimuthCenter, "Hotine Oblique Mercator (variant B)", 40, AZIMUTHS,
-         ProjCenterLatGeoKey, ProjCenterLongGeoKey},
-        {CT_ObliqueMercator_Laborde,
-         "Laborde Oblique Mercator",
-         -18.9,
-         {{ProjAzimuthAngleGeoKey, 18.9}},
-         ProjCenterLatGeoKey,
-         ProjCenterLongGeoKey},
-        {CT_ObliqueMercator_Rosenmund,
-         "Hotine Oblique Mercator (variant B)",
-         46.9,
-         {},
-         ProjCenterLatGeoKey,
-         ProjCenterLongGeoKey},
+        {CT_ObliqueMercator, "Hotine Oblique Mercator (variant A)", FREE, AZIMUTHS, CENTER},
+        {CT_HotineObliqueMercatorAzimuthCenter, "Hotine Oblique Mercator (variant B)", 40, AZIMUTHS, CENTER},
+        {CT_ObliqueMercator_Laborde, "Laborde Oblique Mercator", -18.9, AZIMUTH_19, CENTER},
+        {CT_ObliqueMercator_Rosenmund, "Hotine Oblique Mercator (variant B)", 46.9, {}, CENTER},
         {CT_Mercator, "Mercator (variant A)", 0, {{ProjScaleAtNatOriginGeoKey, 0.9}}},
         {CT_Mercator, "Mercator (variant B)", 0, {{ProjStdParallel1GeoKey, 42}}},
-        {CT_LambertConfConic_2SP, "Lambert Conic Conformal (2SP)", 50, PARALLELS, ProjFalseOriginLatGeoKey,
-         ProjFalseOriginLongGeoKey},
+        {CT_LambertConfConic_2SP, "Lambert Conic Conformal (2SP)", 50, PARALLELS, FALSE_ORIGIN},
         {CT_LambertConfConic_1SP, "Lambert Conic Conformal (1SP)", 50, {}},
-        {CT_LambertAzimEqualArea, "Lambert Azimuthal Equal Area", 52, {}, ProjCenterLatGeoKey, ProjCenterLongGeoKey},
+        {CT_LambertAzimEqualArea, "Lambert Azimuthal Equal Area", 52, {}, CENTER},
         {CT_AlbersEqualArea, "Albers Equal Area", 50, PARALLELS},
         {CT_AzimuthalEquidistant, "Modified Azimuthal Equidistant", 50, {}},
         {CT_EquidistantConic, "Equidistant Conic", 50, PARALLELS},
         {CT_Stereographic, "Stereographic", 50, {}},
-        {CT_PolarStereographic,
-         "Polar Stereographic (variant A)",
-         90,
-         {{ProjScaleAtNatOriginGeoKey, 0.994}},
-         ProjNatOriginLatGeoKey,
-         ProjStraightVertPoleLongGeoKey},
-        {CT_PolarStereographic,
-         "Polar Stereographic (variant B)",
-         -71,
-         {},
-         ProjNatOriginLatGeoKey,
-         ProjStraightVertPoleLongGeoKey},
+        {CT_PolarStereographic, "Polar Stereographic (variant A)", 90, SCALE, POLE},
+        {CT_PolarStereographic, "Polar Stereographic (variant B)", -71, {}, POLE},
         {CT_ObliqueStereographic, "Oblique Stereographic", 50, {}},
-        {CT_Equirectangular,
-         "Equidistant Cylindrical",
-         0,
-         {{ProjStdParallel1GeoKey, 30}},
-         ProjCenterLatGeoKey,
-         ProjCenterLongGeoKey},
+        {CT_Equirectangular, "Equidistant Cylindrical", 0, PARALLEL, CENTER},
         {CT_CassiniSoldner, "Cassini-Soldner", 10, {}},
         {CT_Gnomonic, "Gnomonic", 50, {}},
         {CT_MillerCylindrical, "Miller Cylindrical", 0, {}},
@@ -344,15 +321,15 @@ TEST(GeoKeys, EveryProjectionMethodHasItsOriginInTheRightPlace)
         {CT_VanDerGrinten, "Van Der Grinten", 0, {}},
         {CT_NewZealandMapGrid, "New Zealand Map Grid", -41, NEW_ZEALAND},
         {CT_TransvMercator_SouthOriented, "Transverse Mercator (South Orientated)", -20, NO_OFFSET},
-        {CT_CylindricalEqualArea, "Lambert Cylindrical Equal Area", 0, {{ProjStdParallel1GeoKey, 30}}}};
+        {CT_CylindricalEqualArea, "Lambert Cylindrical Equal Area", 0, PARALLEL}};
     for (const Case& oCase : CASES)
     {
         SCOPED_TRACE(oCase.name);
         const double nLongitude = oCase.method == CT_NewZealandMapGrid ? 173.0 : 12.0;
         Keys oKeys;
         oKeys.Projected().Code(GeographicTypeGeoKey, 4326).Code(ProjCoordTransGeoKey, oCase.method);
-        oKeys.Number(oCase.latitudeKey, {oCase.latitude == FREE ? 40.0 : oCase.latitude});
-        oKeys.Number(oCase.longitudeKey, {nLongitude});
+        oKeys.Number(oCase.origin.first, {oCase.latitude == FREE ? 40.0 : oCase.latitude});
+        oKeys.Number(oCase.origin.second, {nLongitude});
         oKeys.Number(ProjFalseEastingGeoKey, {700000.0}).Number(ProjFalseNorthingGeoKey, {300000.0});
         for (const auto& [nKey, nValue] : oCase.numbers)
             oKeys.Number(nKey, {nValue});

@@ -429,6 +429,24 @@ TEST(TifHostile, WhatLibtiffGivesAsColoursOnlyIsRefused)
     }
 }
 
+// Of data that make no sense some codecs make up pixels, with a warning.
+TEST(TifHostile, PixelsThatACodecMadeUpAreRefused)
+{
+    for (const Recipe& oRecipe : RECIPES)
+    {
+        const bool bFax = oRecipe.compression == COMPRESSION_CCITTFAX3 || oRecipe.compression == COMPRESSION_CCITTFAX4;
+        if (!bFax && oRecipe.compression != COMPRESSION_JPEG)
+            continue;
+        const TemporaryFile oName;
+        MakeFile(oName.GetName(), oRecipe);
+        Bytes oBytes = ReadBytes(oName.GetName());
+        oBytes[60] = bFax ? 0 : 0xFF;
+        oBytes[61] = bFax ? 0 : 0xD9;
+        WriteBytes(oName.GetName(), oBytes);
+        EXPECT_NE(UseFile(oName.GetName()), "") << oRecipe.compression;
+    }
+}
+
 TEST(TifHostile, OnlyTiffFilesAreClaimed)
 {
     krv::plugins::tif::TifBuilder oBuilder;

@@ -144,9 +144,10 @@ private:
     {
         Made oMade{};
         oMade.sample = SAMPLES[Pick(moRandom, 0, std::size(SAMPLES) - 1)];
-        oMade.width = Pick(moRandom, 1, 90);
-        oMade.height = Pick(moRandom, 1, 90);
-        oMade.channels = Pick(moRandom, 1, 5);
+        const bool bWide = Pick(moRandom, 0, 7) == 0; // so that rows are worked on in several pieces
+        oMade.width = bWide ? Pick(moRandom, 500, 3000) : Pick(moRandom, 1, 90);
+        oMade.height = Pick(moRandom, 1, bWide ? 5 : 90);
+        oMade.channels = Pick(moRandom, 0, 7) == 0 ? Pick(moRandom, 6, 40) : Pick(moRandom, 1, 5);
         oMade.planar = oMade.channels > 1 && Pick(moRandom, 0, 1) == 1;
         oMade.tiled = Pick(moRandom, 0, 1) == 1;
         oMade.big = Pick(moRandom, 0, 3) == 0;
@@ -238,10 +239,15 @@ private:
         EXPECT_EQ(nDone, nBytes) << oMade.Describe();
     }
 
+    // Any bits; now and then all of one kind above or below a place: ends of ranges, infinities, tiny numbers.
     std::uint64_t RandomBits(unsigned int nBits)
     {
-        const std::uint64_t nValue = std::uint64_t{moRandom()} << 32 | moRandom();
-        return nBits == 64 ? nValue : nValue & ((std::uint64_t{1} << nBits) - 1);
+        const std::uint64_t nAll = ~std::uint64_t{0} >> (64 - nBits);
+        const unsigned int nKind = Pick(moRandom, 0, 15);
+        const unsigned int nPlace = Pick(moRandom, 0, nBits - 1);
+        if (nKind < 4)
+            return (nKind % 2 == 0 ? nAll << nPlace & nAll : nAll >> nPlace) & (nKind < 2 ? nAll : nAll >> 1);
+        return (std::uint64_t{moRandom()} << 32 | moRandom()) & nAll;
     }
 
     static void Expect(Made& oMade, unsigned int nX, unsigned int nY, unsigned int nChannel, unsigned int nPart,
@@ -279,7 +285,7 @@ Window ChooseWindow(Random& oRandom, const Made& oMade, const krv::datasources::
     }
     oWindow.x = static_cast<int>(Pick(oRandom, 0, oMade.width + 40)) - 20;
     oWindow.y = static_cast<int>(Pick(oRandom, 0, oMade.height + 40)) - 20;
-    oWindow.width = Pick(oRandom, 1, 60);
+    oWindow.width = Pick(oRandom, 1, oMade.width > 400 ? oMade.width : 60);
     oWindow.height = Pick(oRandom, 1, 60);
     oWindow.partX = Pick(oRandom, 0, oWindow.width);
     oWindow.partY = Pick(oRandom, 0, oWindow.height);
@@ -316,7 +322,7 @@ std::vector<unsigned int> ChooseChannels(Random& oRandom, unsigned int nCount)
 {
     if (Pick(oRandom, 0, 1) == 0)
         return krv::test::AllChannels(nCount);
-    std::vector<unsigned int> oChannels(Pick(oRandom, 1, 6));
+    std::vector<unsigned int> oChannels(Pick(oRandom, 1, 9));
     for (unsigned int& nChannel : oChannels)
         nChannel = Pick(oRandom, 1, nCount);
     return oChannels;
