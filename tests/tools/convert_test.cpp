@@ -12,16 +12,14 @@
 #include "datasources/writer/basicwriter.h"
 #include "gobs/raster/raster.h"
 #include "tests/support/demofile.h"
+#include "tests/support/facts.h"
 #include "tests/support/tempfolder.h"
 #include "tests/tools/programrun.h"
 
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <cstdlib>
 #include <filesystem>
-#include <fstream>
-#include <map>
 #include <memory>
 #include <set>
 #include <sstream>
@@ -35,52 +33,30 @@ namespace
 using krv::datasources::BasicReader;
 using krv::datasources::DatasetManager;
 using krv::datasources::IDataset;
+using krv::test::DataFolder;
+using krv::test::Facts;
 using krv::test::ProgramRun;
 using krv::test::RunKrv;
 using krv::test::TempFolder;
 using nlohmann::json;
 
-using Row = std::map<std::string, std::string>;
 using Texts = std::vector<std::string>;
 
-std::string DataFolder()
-{
-    const char* const pFolder = std::getenv("KRV_TEST_DATA");
-    return pFolder != nullptr ? pFolder : KRV_TEST_DATA;
-}
-
-Texts SplitLine(const std::string& text)
-{
-    Texts oParts;
-    std::stringstream oStream(text);
-    for (std::string part; std::getline(oStream, part, '\t');)
-        oParts.push_back(part);
-    return oParts;
-}
-
 // Of the files that lose nothing those that show something which no file before them did.
-std::vector<Row> ChooseFiles()
+std::vector<Facts> ChooseFiles()
 {
-    std::vector<Row> oChosen;
+    std::vector<Facts> oChosen;
     std::set<std::string> oSeen;
-    std::ifstream oStream(DataFolder() + "/FACTS.tsv");
-    std::string line;
-    std::getline(oStream, line);
-    const Texts oNames = SplitLine(line);
-    while (std::getline(oStream, line))
+    for (const Facts& oRow : krv::test::GetFacts())
     {
-        const Texts oValues = SplitLine(line);
-        Row oRow;
-        for (std::size_t i = 0; i < oNames.size(); ++i)
-            oRow[oNames[i]] = i < oValues.size() ? oValues[i] : "-";
         bool bNew = false;
         for (const char* pName : {"container", "byte_order", "type", "interleave", "layout", "compression", "predictor",
                                   "photometric", "extra_samples", "raster_type"})
             bNew = oSeen.insert(std::string(pName) + oRow[pName]).second || bNew;
         for (const char* pName : {"palette", "no_data", "rpc", "masks", "overviews", "geotransform"})
-            bNew = oSeen.insert(std::string(pName) + (oRow[pName] != "-" ? "+" : "-")).second || bNew;
+            bNew = oSeen.insert(std::string(pName) + (oRow.Has(pName) ? "+" : "-")).second || bNew;
         bNew = oSeen.insert(oRow["tie_points"].size() > 1 ? "points" : "none").second || bNew;
-        if (bNew && oRow["lossy"] != "yes")
+        if (bNew && !oRow.IsLossy())
             oChosen.push_back(oRow);
     }
     return oChosen;
@@ -135,17 +111,17 @@ std::unique_ptr<IDataset> OpenFile(const std::string& file, AccessMode eMode = e
 
 TEST(Convert, RealFilesKeepPixelsAndInformationInEveryLayout)
 {
-    if (!std::filesystem::exists(DataFolder() + "/FACTS.tsv"))
+    if (krv::test::GetFacts().empty())
         GTEST_SKIP() << "no folder of real files";
     const Texts FORMS = {"TILED=YES", "TILED=NO COMPRESS=DEFLATE", "COMPRESS=LZW",
                          "COMPRESS=ZSTD BLOCKXSIZE=128 BLOCKYSIZE=64", "INTERLEAVE=BAND TILED=NO BIGTIFF=YES"};
     const TempFolder oFolder;
     const std::string there = oFolder.File("there.tif"), back = oFolder.File("back.tif");
     std::size_t nForm = 0;
-    for (Row& oRow : ChooseFiles())
+    for (const Facts& oRow : ChooseFiles())
     {
         SCOPED_TRACE(oRow["file"]);
-        const std::string file = DataFolder() + "/" + oRow["file"];
+        const std::string file = oRow.GetPath();
         const auto oThere = RunConvert({file, there, "--options", FORMS[nForm++ % FORMS.size()]});
         ASSERT_EQ(oThere.code, 0) << oThere.errors;
         const auto oBack = RunConvert({there, back, "--options", "TILED=NO"});
