@@ -32,8 +32,8 @@ public:
     // The first error since the last call, or nAlternative when there was none.
     std::string TakeMessage(const char* pAlternative);
 
-    // Whether anything failed, or a codec made up pixels for data that it could not decode, since Forget(). libtiff calls
-    // some of that a success.
+    // Whether anything failed, or a codec made up pixels for data that it could not decode, since Forget(). libtiff
+    // calls some of that a success.
     bool HasLostData() const;
 
     void Forget();
