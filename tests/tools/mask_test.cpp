@@ -18,6 +18,7 @@
 #include <png.h>
 
 #include <algorithm>
+#include <cmath>
 #include <cstdlib>
 #include <filesystem>
 #include <memory>
@@ -103,10 +104,14 @@ TEST_F(MaskCommand, PolygonsMeanTheSamePixelsInEveryReferenceSystem)
     for (const auto& aRing : aRings)
     {
         json oRing = json::array();
-        for (int i = 0; i < 5; ++i)
+        // Many vertices, since an edge is straight in one of the systems only.
+        constexpr int PIECES = 64;
+        for (int i = 0; i <= 4 * PIECES; ++i)
         {
-            const double* const pVertex = aRing[i % 4];
-            const char* const pEnd = i < 4 ? ", " : &aRing == &aRings[0] ? "), (" : ")";
+            const double *const pFrom = aRing[i / PIECES % 4], *const pTo = aRing[(i / PIECES + 1) % 4];
+            const double pVertex[] = {std::lerp(pFrom[0], pTo[0], i % PIECES / double{PIECES}),
+                                      std::lerp(pFrom[1], pTo[1], i % PIECES / double{PIECES})};
+            const char* const pEnd = i < 4 * PIECES ? ", " : &aRing == &aRings[0] ? "), (" : ")";
             double nX = 0, nY = 0;
             oGeocoding.RasterToMap(pVertex[0], pVertex[1], nX, nY);
             double nDegreesX = nX, nDegreesY = nY, nMercatorX = nX, nMercatorY = nY;
@@ -143,6 +148,24 @@ TEST_F(MaskCommand, PolygonsMeanTheSamePixelsInEveryReferenceSystem)
     Written({"--polygon", "POLYGON((0 0,20 0,20 10,0 10))", "--polygon",
              R"({"type":"Polygon","coordinates":[[[10,0],[30,0],[30,10],[10,10]]]})", "--coordinates", "pixel"});
     EXPECT_EQ(moReport["set"], 300);
+}
+
+TEST_F(MaskCommand, LongEdgesBendBetweenReferenceSystems)
+{
+    const auto Set = [this](const std::string& polygon)
+    {
+        return RunKrv({"mask", moFile, "--crs", "EPSG:4326", "--polygon", polygon, "--json"}).Json()["set"].get<int>();
+    };
+    std::string fine = "POLYGON((";
+    for (int i = 0; i <= 3000; ++i)
+        fine += std::to_string(-90 + i * 0.01) + " 25,";
+    const int nHalf = Set("POLYGON((-90 25,-60 25,-60 40,-90 40,-90 25))");
+    EXPECT_GT(nHalf, 100000);
+    EXPECT_NEAR(nHalf, Set(fine + "-60 40,-90 40,-90 25))"), 100);
+    // The same a turn further, and the whole world.
+    EXPECT_EQ(Set("POLYGON((270 25,300 25,300 40,270 40,270 25))"), nHalf);
+    EXPECT_EQ(Set("POLYGON((-180 -80,180 -80,180 84,-180 84,-180 -80))"), int{WIDTH * HEIGHT});
+    EXPECT_EQ(Set("POLYGON((0 -80,90 -80,90 84,0 84))"), 0);
 }
 
 TEST_F(MaskCommand, NoDataIsStoredAsItsComplement)
@@ -240,12 +263,16 @@ TEST_F(MaskCommand, FailuresSayWhyOnOneLineAndChangeNothing)
         {{moFile, "--polygon", "POLYGON((0 0,nan 0,4 4))"}, 2, "a number is expected"},
         {{moFile, "--polygon", "POLYGON((0 0,1e400 0,4 4))"}, 2, "a number is expected"},
         {{moFile, "--polygon", "POLYGON EMPTY"}, 2, "no polygon"},
-        {{moFile, "--polygon", "POINT(1 2)"}, 2, "no such file"},
+        {{moFile, "--polygon", "zones(1).json"}, 2, "no such file"},
+        {{moFile, "--polygon", "POINT(1 2)"}, 2, "expected at character 1 "},
+        {{moFile, "--polygon", "null"}, 2, "expected at character 1 "},
+        {{moFile, "--polygon", "SRID=4326;" + square, "--coordinates", "pixel"}, 2, "EPSG:4326"},
+        {{moFile, "--polygon", square, "--crs", ""}, 2, "no known reference system"},
         {{moFile, "--polygon", moFolder.GetPath()}, 2, "folder"},
         {{moFile, "--polygon", moFile}, 2, "scene.tif"},
         {{moFile, "--polygon", R"({"type":"Polygon","coordinates":[[[1],[2,3]]]})"}, 2, "[x, y]"},
         {{moFile, "--polygon", R"({"type":"Polygon"})"}, 2, "coordinates"},
-        {{moFile, "--polygon", R"({"type":"Polygon",)"}, 2, "GeoJSON"},
+        {{moFile, "--polygon", R"({"type":"Polygon",)"}, 2, "not valid: parse error"},
         {{moFile, "--polygon", R"({"type":"Polygon","coordinates":[[[0,1e999],[1,2]]]})"}, 2, "GeoJSON"},
         {{moFile, "--polygon", R"({"type":"Polygon","coordinates":[[[0,95],[1,2],[3,4]]]})"}, 1, "0 95"},
         {{demo, "--polygon", square}, 1, "not georeferenced"},

@@ -2,7 +2,6 @@
 
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
-#include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/maskbuilder/bitmapmaskbuilder.h"
 #include "datasources/maskbuilder/polygonmaskbuilder.h"
@@ -14,11 +13,9 @@
 #include "gobs/tile/tileiterator.h"
 #include "toolkit/core/gglshape.h"
 #include "toolkit/exceptions/exceptions.h"
-#include "toolkit/ogc/cs/coordinatetransformation.h"
-#include "toolkit/ogc/cs/crsfactory.h"
-#include "toolkit/ogc/cs/geocodinginfo.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/pngwriter.h"
+#include "tools/krv/polygonplacer.h"
 #include "tools/krv/polygontext.h"
 #include "tools/krv/progress.h"
 #include "tools/krv/sourcefile.h"
@@ -44,80 +41,27 @@ using krv::gobs::RasterInfo;
 using MaskPointer = std::unique_ptr<Mask>;
 using TileMasker = std::function<MaskPointer(const RasterInfo&, const RasterContext&)>;
 
-// Where vertices lie in the image.
-class PixelPlacer
-{
-public:
-    PixelPlacer(const SourceFile& oFile, const MaskRequest& oRequest, const PolygonText& oText) : moFile(oFile)
-    {
-        PolygonCoordinates eMeaning = oRequest.coordinates;
-        std::string crs = oRequest.crs;
-        if (eMeaning == PolygonCoordinates::eAsWritten && (oText.geoJson || !oText.crs.empty()))
-        {
-            eMeaning = PolygonCoordinates::eNamedMap;
-            crs = oText.crs.empty() ? "EPSG:4326" : oText.crs;
-        }
-        if (eMeaning == PolygonCoordinates::ePixels)
-            return;
-        const auto* const poGeocoded = dynamic_cast<krv::datasources::IGeocodedDataset*>(&oFile.GetDataset());
-        if (poGeocoded == nullptr || poGeocoded->GetGeocoding().IsIdentity() ||
-            !poGeocoded->GetGeocoding().IsInvertible())
-            throw krv::DataException(oFile.GetName() + ": the file is not georeferenced; give polygons in pixels, with "
-                                                       "--coordinates pixel");
-        moGeocoding = poGeocoded->GetGeocoding();
-        if (eMeaning != PolygonCoordinates::eNamedMap)
-            return;
-        const std::unique_ptr<krv::ogc::cs::ICRS> poTarget(oFile.GetDataset().ReadCRS());
-        if (poTarget == nullptr)
-            throw krv::DataException(oFile.GetName() + ": the file names no reference system; give polygons in its own "
-                                                       "map units, with --coordinates map");
-        moTransformation.emplace(*krv::ogc::cs::CreateCRSFromWKT(crs), *poTarget);
-    }
-
-    void Place(std::vector<GDBVertex>& oRing) const
-    {
-        for (GDBVertex& oVertex : oRing)
-        {
-            const GDBVertex oGiven = oVertex;
-            if (moTransformation && !moTransformation->Transform(oVertex.x, oVertex.y))
-                throw krv::DataException(fmt::format(
-                    "{}: the vertex {} {} cannot be taken to the file's reference system; is the order x y?",
-                    moFile.GetName(), oGiven.x, oGiven.y));
-            if (moGeocoding)
-                moGeocoding->MapToRaster(oVertex.x, oVertex.y, oVertex.x, oVertex.y);
-        }
-    }
-
-private:
-    const SourceFile& moFile;
-    std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding;
-    std::optional<krv::ogc::cs::CoordinateTransformation> moTransformation;
-};
-
 TileMasker MaskPolygons(const SourceFile& oFile, const MaskRequest& oRequest)
 {
     const auto nRows = static_cast<int>(oFile.GetRaster().GetHeight());
     std::shared_ptr<krv::datasources::PolygonMaskBuilder> poBuilder;
     for (const std::string& given : oRequest.polygons)
     {
-        PolygonText oText = ReadPolygons(given);
-        const PixelPlacer oPlacer(oFile, oRequest, oText);
-        for (auto& oRings : oText.polygons)
-        {
-            GGLShape oShape;
-            for (auto& oRing : oRings)
+        const PolygonText oText = ReadPolygons(given);
+        PolygonPlacer oPlacer(oFile, oRequest, oText);
+        for (const auto& oRings : oText.polygons)
+            for (const GGLShape& oShape : oPlacer.Place(oRings))
             {
-                oPlacer.Place(oRing);
-                oShape.AddRing(oRing);
+                if (poBuilder == nullptr)
+                    poBuilder = std::make_shared<krv::datasources::PolygonMaskBuilder>(oShape, 0, nRows);
+                else
+                    poBuilder->AddPolygon(oShape, 0, nRows);
             }
-            if (poBuilder == nullptr)
-                poBuilder = std::make_shared<krv::datasources::PolygonMaskBuilder>(oShape, 0, nRows);
-            else
-                poBuilder->AddPolygon(oShape, 0, nRows);
-        }
     }
     return [poBuilder](const RasterInfo& oInfo, const RasterContext& oContext)
     {
+        if (poBuilder == nullptr) // all polygons lie elsewhere
+            return std::make_unique<Mask>(oInfo, oContext);
         return MaskPointer(poBuilder->BuildMask(Raster(oInfo, oContext)));
     };
 }

@@ -40,6 +40,7 @@ public:
     {
         for (SkipBlanks(); mnAt < moText.size(); SkipBlanks())
         {
+            const std::size_t nStart = mnAt;
             std::string word = Word();
             while (word.ends_with('Z') || word.ends_with('M'))
                 word.pop_back();
@@ -48,7 +49,10 @@ public:
             else if (word == "POLYGON" || word == "MULTIPOLYGON")
                 Geometry(word == "MULTIPOLYGON", oResult);
             else
-                Fail("POLYGON or MULTIPOLYGON");
+            {
+                mnAt = nStart;
+                Fail("POLYGON, MULTIPOLYGON or a GeoJSON object");
+            }
             while (Take(';') || Take(','))
                 ;
         }
@@ -252,16 +256,29 @@ void ReadGeoJson(const std::string& text, PolygonText& oResult)
     }
     catch (const json::exception& oError)
     {
-        throw UsageError(std::string("the GeoJSON is not valid: ") + oError.what());
+        // In front of its words the library puts a tag of its own in brackets.
+        const std::string what = oError.what();
+        const auto nTag = what.starts_with('[') ? what.find("] ") : std::string::npos;
+        throw UsageError("the GeoJSON is not valid: " + (nTag == std::string::npos ? what : what.substr(nTag + 2)));
     }
 }
 
+// Whether it is meant as a polygon rather than as the name of a file. What is a geometry or JSON but no polygon is
+// text only where there is no such file.
 bool IsPolygonText(const std::string& text)
 {
     const auto oFirst = std::find_if_not(text.begin(), text.end(), IsBlank);
-    std::string start(oFirst, text.end() - oFirst > 5 ? oFirst + 5 : text.end());
+    std::string start(oFirst, text.end() - oFirst > 19 ? oFirst + 19 : text.end());
     std::transform(start.begin(), start.end(), start.begin(), [](unsigned char c) { return std::toupper(c); });
-    return start.starts_with('{') || start == "POLYG" || start == "MULTI" || start == "SRID=";
+    const auto Starts = [&start](const char* pWith)
+    {
+        return start.starts_with(pWith);
+    };
+    constexpr const char* TEXTS[] = {"{", "POLYG", "MULTI", "SRID="};
+    constexpr const char* OTHERS[] = {"[", "POINT(", "POINT ", "LINESTRING", "GEOMETRYCOLLECTION"};
+    return std::any_of(std::begin(TEXTS), std::end(TEXTS), Starts) ||
+           ((start == "NULL" || std::any_of(std::begin(OTHERS), std::end(OTHERS), Starts)) &&
+            !WhyUnreadable(text).empty());
 }
 
 void Parse(const std::string& text, PolygonText& oResult)

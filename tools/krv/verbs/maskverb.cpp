@@ -114,8 +114,12 @@ void AddMaskVerb(CLI::App& oApp, Selection& oSelection)
                      "Of the polygons: pixel ((0, 0) is the outer corner of the first) or map (the file's own system, "
                      "the rule for WKT; GeoJSON is longitude, latitude otherwise)")
         ->check(CLI::IsMember({"pixel", "map"}));
-    poVerb->add_option("--crs", poOptions->request.crs,
-                       "Reference system of the polygons, such as EPSG:4326; x is always the easting or longitude");
+    poVerb
+        ->add_option("--crs", poOptions->request.crs,
+                     "Reference system of the polygons, such as EPSG:4326, in which their edges are straight; x is "
+                     "always the easting or longitude")
+        ->check([](const std::string& text)
+                { return text.empty() ? std::string("the empty text is no known reference system") : std::string(); });
     poVerb->add_option("--bitmap", poOptions->bitmaps, "Pixels set in one of these bitmaps, such as 1,3");
     poVerb->add_flag("--no-data", poOptions->request.noData, "Pixels that equal the recorded no-data values");
     poVerb
