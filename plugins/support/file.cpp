@@ -9,6 +9,7 @@
 #include <cstring>
 
 #include <fcntl.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -64,6 +65,8 @@ std::string MakeTemporaryName(const std::string& fileName, const Place& oPlace)
     struct stat oStatus = {};
     if (::stat(fileName.c_str(), &oStatus) == 0 && !S_ISREG(oStatus.st_mode))
         throw IOException(fileName, fileName + ": is not a plain file and is not replaced", oPlace);
+    if (::access(fileName.c_str(), W_OK) != 0 && errno != ENOENT && errno != ENOTDIR)
+        throw IOException(fileName, fileName + ": cannot be replaced: " + SystemErrorText(errno), oPlace);
     static std::atomic<unsigned int> nCounter = 0;
     const std::size_t nSlash = fileName.rfind('/');
     const std::size_t nBegin = nSlash == std::string::npos ? 0 : nSlash + 1;
@@ -83,6 +86,16 @@ File::File(const std::string& fileName, Mode eMode, const Place& oPlace) : moNam
         ::close(mnDescriptor);
         throw IOException(fileName, fileName + ": is not a plain file", oPlace);
     }
+    // Two writers that know nothing of each other would overwrite what the other added. Some file systems have no
+    // locks.
+    if (eMode != Mode::eRead && ::flock(mnDescriptor, LOCK_EX | LOCK_NB) != 0 && errno == EWOULDBLOCK)
+    {
+        ::close(mnDescriptor);
+        throw IOException(fileName, fileName + ": is being written by another program or dataset", oPlace);
+    }
+    // The size as of now: whoever had the lock may have changed it.
+    if (::fstat(mnDescriptor, &oStatus) != 0)
+        oStatus.st_size = 0;
     mnSize = static_cast<std::uint64_t>(oStatus.st_size);
 }
 
@@ -155,12 +168,14 @@ void File::Write(std::uint64_t nOffset, const void* pSource, std::size_t nBytes,
         const ssize_t nWritten =
             ::pwrite(mnDescriptor, pBytes + nDone, nBytes - nDone, static_cast<off_t>(nOffset + nDone));
         if (nWritten > 0)
+        {
             nDone += static_cast<std::size_t>(nWritten);
+            mnSize = std::max(mnSize, nOffset + nDone);
+        }
         else if (nWritten == 0 || errno != EINTR)
             throw IOException(moName, moName + ": writing failed: " + SystemErrorText(nWritten == 0 ? ENOSPC : errno),
                               Place::Current(oLocation));
     }
-    mnSize = std::max(mnSize, nOffset + nBytes);
 }
 
 void File::WriteRows(std::uint64_t nOffset, std::size_t nStoredPitch, std::size_t nRowBytes, std::size_t nRows,
@@ -188,9 +203,18 @@ void File::CutBack(std::uint64_t nBytes) noexcept
         mnSize = nBytes;
 }
 
+void File::EndWriting() noexcept
+{
+    ::flock(mnDescriptor, LOCK_UN);
+}
+
 // The folder is flushed as well as the system lets it: not every file system has that.
 void File::Rename(const std::string& fileName, const Place& oPlace)
 {
+    // Who may read and write a file does not change with what it holds.
+    struct stat oStatus = {};
+    if (::stat(fileName.c_str(), &oStatus) == 0)
+        ::fchmod(mnDescriptor, oStatus.st_mode & 07777);
     if (std::rename(moPath.c_str(), fileName.c_str()) != 0)
         throw IOException(fileName, fileName + ": cannot be put in its place: " + SystemErrorText(errno), oPlace);
     moPath = fileName;

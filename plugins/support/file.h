@@ -11,7 +11,8 @@
 namespace krv::plugins::support
 {
 
-// An open file that is read and written at given offsets, without mapping and without a position of its own. Every
+// An open file that is read and written at given offsets, without mapping and without a position of its own. A file is
+// written by one object at a time, of all programs; readers are not held up. Every
 // failure is an exception that names the file and the cause, a file that became shorter meanwhile included. A file may
 // be read by several threads.
 class File
@@ -24,8 +25,8 @@ public:
         eCreate  // a new or emptied file
     };
 
-    // Throws FileNotFoundException when there is no such file, IOException when it cannot be opened or is no plain
-    // file.
+    // Throws FileNotFoundException when there is no such file, IOException when it cannot be opened, is no plain file
+    // or is being written by somebody else.
     File(const std::string& fileName, Mode eMode, const Place& oPlace = Place::Current());
     ~File();
     File(const File&) = delete;
@@ -63,11 +64,14 @@ public:
     // it is.
     void CutBack(std::uint64_t nBytes) noexcept;
 
+    // Nothing more is written: others may. Reading goes on.
+    void EndWriting() noexcept;
+
     // From now on messages, and GetName, name the file otherwise.
     void ShowAs(const std::string& fileName) { moName = fileName; }
 
-    // Gives the file another name in the same file system, replacing a file of that name, and makes sure that the name
-    // reaches the disk.
+    // Gives the file another name in the same file system, replacing a file of that name, whose permissions it takes
+    // over, and makes sure that the name reaches the disk.
     void Rename(const std::string& fileName, const Place& oPlace = Place::Current());
 
 private:
@@ -78,8 +82,8 @@ private:
 };
 
 // A name for what becomes fileName when it is whole: in the same folder, so that it can be renamed, of no length that a
-// folder does not take, and of this process alone. Throws IOException when a folder, a device or the like has the name:
-// renaming would put the file in its place.
+// folder does not take, and of this process alone. Throws IOException when a folder, a device or the like has the name,
+// or a file that must not be written: renaming would put the file in its place.
 std::string MakeTemporaryName(const std::string& fileName, const Place& oPlace = Place::Current());
 
 // The text of an error number, in the C locale.

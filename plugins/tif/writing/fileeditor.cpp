@@ -86,7 +86,7 @@ void FileEditor::Discard() noexcept
 {
     if (!mbEnded && moTemporary.empty() && mpoFile)
         mpoFile->CutBack(mnCommittedSize);
-    mbEnded = true;
+    End();
     if (moTemporary.empty())
         return;
     std::remove(moTemporary.c_str());
@@ -96,6 +96,8 @@ void FileEditor::Discard() noexcept
 void FileEditor::End()
 {
     mbEnded = true;
+    if (mpoFile)
+        mpoFile->EndWriting();
 }
 
 void FileEditor::Fail(const std::string& what, const Place& oPlace) const
@@ -205,6 +207,12 @@ void FileEditor::ReadStriles(PageModel& oPage, const RawDirectory& oDirectory)
     oPage.moOffsets.resize(nStriles);
     oPage.moByteCounts.resize(nStriles);
     oPage.moRoom = oPage.moByteCounts;
+    // What is added to the file would otherwise be taken for what is missing.
+    for (std::uint64_t nAt = 0; nAt < nStriles; ++nAt)
+        if (oPage.moByteCounts[nAt] > mpoFile->GetSize() ||
+            oPage.moOffsets[nAt] > mpoFile->GetSize() - oPage.moByteCounts[nAt])
+            Fail("the file is truncated: strip or tile " + std::to_string(nAt) +
+                 " lies behind its end; it cannot be updated");
     if (pOffsets->GetBytes() > nWord)
         oPage.moOffsetArray = {pOffsets->mnOffset, pOffsets->GetBytes(), 0};
     if (pCounts->GetBytes() > nWord)

@@ -200,18 +200,27 @@ std::shared_ptr<PageModel> MakeImagePage(const NewImage& oImage, const CreateOpt
 
 std::shared_ptr<PageModel> MakeReducedPage(const PageModel& oFull, std::uint32_t nWidth, std::uint32_t nHeight)
 {
-    constexpr std::uint16_t KEPT[] = {TIFFTAG_BITSPERSAMPLE,    TIFFTAG_COMPRESSION,
-                                      TIFFTAG_PHOTOMETRIC,      TIFFTAG_FILLORDER,
-                                      TIFFTAG_SAMPLESPERPIXEL,  TIFFTAG_PLANARCONFIG,
-                                      TIFFTAG_PREDICTOR,        TIFFTAG_COLORMAP,
-                                      TIFFTAG_EXTRASAMPLES,     TIFFTAG_SAMPLEFORMAT,
-                                      TIFFTAG_YCBCRSUBSAMPLING, TIFFTAG_REFERENCEBLACKWHITE,
-                                      TIFFTAG_INKSET,           42113};
+    constexpr std::uint16_t KEPT[] = {TIFFTAG_BITSPERSAMPLE,
+                                      TIFFTAG_COMPRESSION,
+                                      TIFFTAG_PHOTOMETRIC,
+                                      TIFFTAG_SAMPLESPERPIXEL,
+                                      TIFFTAG_PLANARCONFIG,
+                                      TIFFTAG_PREDICTOR,
+                                      TIFFTAG_COLORMAP,
+                                      TIFFTAG_EXTRASAMPLES,
+                                      TIFFTAG_SAMPLEFORMAT,
+                                      TIFFTAG_YCBCRSUBSAMPLING,
+                                      TIFFTAG_REFERENCEBLACKWHITE,
+                                      TIFFTAG_INKSET,
+                                      42113};
     auto poPage = std::make_shared<PageModel>(oFull.moTags.IsBigEndian());
     TagList& oTags = poPage->moTags;
     for (const std::uint16_t nTag : KEPT)
         if (const Tag* pTag = oFull.moTags.Find(nTag))
             oTags.Set(CopyTag(*pTag));
+    const std::uint64_t nCompression = oTags.GetNumber(TIFFTAG_COMPRESSION, COMPRESSION_NONE);
+    if (nCompression >= COMPRESSION_CCITTRLE && nCompression <= COMPRESSION_CCITTFAX4)
+        oTags.SetNumber(TIFFTAG_COMPRESSION, TIFF_SHORT, COMPRESSION_ADOBE_DEFLATE); // facsimile is only read
     const std::uint64_t nKind = oFull.moTags.GetNumber(TIFFTAG_SUBFILETYPE, 0);
     oTags.SetNumber(TIFFTAG_SUBFILETYPE, TIFF_LONG, nKind | FILETYPE_REDUCEDIMAGE);
     oTags.SetNumber(TIFFTAG_IMAGEWIDTH, TIFF_LONG, nWidth);

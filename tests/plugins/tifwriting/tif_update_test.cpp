@@ -173,6 +173,33 @@ TEST(TifUpdate, AFullDiskAndAMissingFolderAreReported)
     EXPECT_THROW(OpenTif(oFolder.Write("text.tif", "no image"), eUpdate), krv::FileException);
 }
 
+// Two writers would overwrite each other, and what is added to a file that was cut would be taken for what it lacks.
+TEST(TifUpdate, AFileHasOneWriterAndIsWhole)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("one.tif");
+    TifPointer poDataset = CreateTif(fileName, "COMPRESS=DEFLATE", 300, 200, 1, krv::gobs::eDT_8U);
+    WriteAll(*poDataset, Bytes(300 * 200, 7));
+    poDataset->Synchronize();
+    EXPECT_THROW(OpenTif(fileName, eUpdate), krv::IOException);
+    EXPECT_EQ(ReadAll(*OpenTif(fileName)), Bytes(300 * 200, 7));
+    poDataset->Close();
+    EXPECT_NO_THROW(OpenTif(fileName, eUpdate));
+
+    std::filesystem::permissions(fileName, std::filesystem::perms(0600));
+    CreateTif(fileName, "", 300, 200, 1, krv::gobs::eDT_8U)->Synchronize();
+    EXPECT_EQ(std::filesystem::status(fileName).permissions(), std::filesystem::perms(0600));
+
+    const TifPointer poOrdered = CreateTif(oFolder.File("cut.tif"), "LAYOUT=COG", 300, 2000, 1, krv::gobs::eDT_8U);
+    WriteAll(*poOrdered, Bytes(300 * 2000, 7));
+    poOrdered->Close(); // its directories lie before its pixels
+    const std::string bytes = ReadFile(oFolder.File("cut.tif"));
+    EXPECT_NO_THROW(OpenTif(oFolder.Write("shorter.tif", bytes), eUpdate));
+    for (std::size_t nBytes = bytes.size() - 20011; nBytes > bytes.size() / 2; nBytes -= 20011)
+        EXPECT_THROW(OpenTif(oFolder.Write("shorter.tif", bytes.substr(0, nBytes)), eUpdate), krv::FileException)
+            << nBytes;
+}
+
 TEST(TifUpdate, MetadataComeBackByteForByteAndForeignItemsStay)
 {
     const TempFolder oFolder;
