@@ -4,6 +4,7 @@
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/crsfactory.h"
 #include "tools/krv/errors.h"
 
@@ -216,7 +217,10 @@ void PolygonPlacer::Split(const GDBVertex& oFrom, const GDBVertex& oTo, const GD
         nDepth < LONG_DEPTH && std::hypot(oPixelTo.x - oPixelFrom.x, oPixelTo.y - oPixelFrom.y) > LONG_EDGE;
     if (!bLong && DistanceToSegment(oPixel, oPixelFrom, oPixelTo) <= TOLERANCE)
         return;
-    ++mnAdded;
+    if (++mnAdded == MOST_ADDED)
+        krv::nspio::Warning::Warn(
+            "the polygons have too many long edges; from some on they are not bent as they should be",
+            "tools/krv/polygonplacer", 0);
     Split(oFrom, oMiddle, oPixelFrom, oPixel, nDepth + 1, oResult);
     oResult.push_back(oPixel);
     Split(oMiddle, oTo, oPixel, oPixelTo, nDepth + 1, oResult);
