@@ -187,7 +187,10 @@ Judgement Judge(const std::string& fileName, unsigned int nDirectory)
     TIFFGetField(pTiff, TIFFTAG_TILEWIDTH, &nBlockWidth);
     TIFFGetFieldDefaulted(pTiff, oJudgement.mbTiled ? TIFFTAG_TILELENGTH : TIFFTAG_ROWSPERSTRIP, &nBlockHeight);
 
+    if (oJudgement.mnCompression == COMPRESSION_JPEG)
+        TIFFSetField(pTiff, TIFFTAG_JPEGCOLORMODE, JPEGCOLORMODE_RGB); // all samples, whatever the subsampling
     const std::size_t nSampleBytes = nBits == 1 ? 1 : nBits / 8;
+    const bool bPlaced = nBits == 1 || nBits % 8 == 0;
     oJudgement.moPixels.assign(
         std::size_t{oJudgement.mnWidth} * oJudgement.mnHeight * oJudgement.mnChannels * nSampleBytes, 0xEE);
     const auto nSize = oJudgement.mbTiled ? TIFFTileSize(pTiff) : TIFFStripSize(pTiff);
@@ -206,8 +209,9 @@ Judgement Judge(const std::string& fileName, unsigned int nDirectory)
                 TIFFReadEncodedStrip(pTiff, nBlock, oBlock.data(), nSize);
         }
         const unsigned int nInPlane = nBlock % (nAcross * nDown);
-        Place(oJudgement, oBlock.data(), nSampleBytes, nBits == 1, nInPlane % nAcross * nBlockWidth,
-              nInPlane / nAcross * nBlockHeight, nBlockWidth, nBlockHeight, nBlock / (nAcross * nDown));
+        if (bPlaced)
+            Place(oJudgement, oBlock.data(), nSampleBytes, nBits == 1, nInPlane % nAcross * nBlockWidth,
+                  nInPlane / nAcross * nBlockHeight, nBlockWidth, nBlockHeight, nBlock / (nAcross * nDown));
     }
     oJudgement.moComplaints = soComplaints;
     return oJudgement;

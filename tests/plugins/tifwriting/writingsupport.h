@@ -40,7 +40,8 @@ Bytes MakePixels(unsigned int nWidth, unsigned int nHeight, unsigned int nChanne
                  unsigned int nSeed);
 
 // What libtiff alone makes of a directory of a file: pixel-interleaved samples in this machine's order, of whole bytes
-// or single bits widened to bytes. What libtiff complains about is in the second one, empty when nothing.
+// or single bits widened to bytes; those of other widths are only decoded. What libtiff complains about is in the
+// second one, empty when nothing.
 struct Judgement
 {
     std::uint32_t mnWidth = 0;
