@@ -43,19 +43,6 @@ namespace detail = krv::datasources::detail;
 
 const std::vector<unsigned int> LEVELS = {2, 4, 8, 16, 32};
 
-double Seconds(const std::function<void()>& oRun)
-{
-    const auto oStart = std::chrono::steady_clock::now();
-    oRun();
-    return std::chrono::duration<double>(std::chrono::steady_clock::now() - oStart).count();
-}
-
-double Median(std::vector<double> oValues)
-{
-    std::sort(oValues.begin(), oValues.end());
-    return oValues[oValues.size() / 2];
-}
-
 void Build(const std::string& file, bool bSync)
 {
     BasicWriter oWriter(file);

@@ -9,9 +9,6 @@
 namespace krv::benchmarks
 {
 
-namespace
-{
-
 double Seconds(const std::function<void()>& oRun)
 {
     const auto oStart = std::chrono::steady_clock::now();
@@ -24,8 +21,6 @@ double Median(std::vector<double> oValues)
     std::sort(oValues.begin(), oValues.end());
     return oValues[oValues.size() / 2];
 }
-
-} // namespace
 
 std::vector<double> MedianSeconds(const std::vector<Candidate>& oCandidates, int nRounds)
 {

@@ -8,6 +8,10 @@
 namespace krv::benchmarks
 {
 
+// The wall time of one run, and the middle one of several values.
+double Seconds(const std::function<void()>& oRun);
+double Median(std::vector<double> oValues);
+
 struct Candidate
 {
     std::string moName;

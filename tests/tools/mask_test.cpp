@@ -7,6 +7,7 @@
 #include "datasources/reader/basicreader.h"
 #include "gobs/raster/raster.h"
 #include "tests/support/demofile.h"
+#include "tests/support/facts.h"
 #include "tests/support/recipe.h"
 #include "tests/support/tempfolder.h"
 #include "tests/tools/programrun.h"
@@ -19,7 +20,6 @@
 
 #include <algorithm>
 #include <cmath>
-#include <cstdlib>
 #include <filesystem>
 #include <memory>
 
@@ -45,9 +45,7 @@ class MaskCommand : public testing::Test
 protected:
     void SetUp() override
     {
-        const char* const pFolder = std::getenv("KRV_TEST_DATA");
-        const std::string source =
-            std::string(pFolder != nullptr ? pFolder : KRV_TEST_DATA) + "/optical/rgb_deflate.tif";
+        const std::string source = krv::test::DataFolder() + "/optical/rgb_deflate.tif";
         if (!std::filesystem::exists(source))
             GTEST_SKIP() << "no " << source;
         krv::test::WriteFile(moFile, krv::test::ReadFile(source));

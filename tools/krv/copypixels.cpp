@@ -5,11 +5,12 @@
 #include "gobs/raster/buffertype.h"
 #include "gobs/raster/raster.h"
 #include "toolkit/core/hmalloc.h"
-#include "toolkit/raster/copydata.h"
+#include "toolkit/raster/merger.h"
 #include "tools/krv/progress.h"
 
 #include <algorithm>
 #include <memory>
+#include <optional>
 
 namespace krv::tool
 {
@@ -59,14 +60,15 @@ unsigned int Stretch(unsigned int nBlock, unsigned int nSourceBlock, unsigned in
 
 PieceSize ChoosePiece(const std::vector<CopySource>& oSources, const IRasterWriter& oWriter)
 {
-    std::uint64_t nPixelBytes = PixelBytes(oWriter);
+    std::uint64_t nSourceBytes = 0; // of a pixel of all sources: their buffers are there at one time
     unsigned int nWidth = 1, nHeight = 1;
     for (const CopySource& oSource : oSources)
     {
-        nPixelBytes = std::max(nPixelBytes, PixelBytes(*oSource.reader));
+        nSourceBytes += PixelBytes(*oSource.reader);
         nWidth = std::max(nWidth, oSource.reader->GetTileWidth());
         nHeight = std::max(nHeight, oSource.reader->GetTileHeight());
     }
+    const std::uint64_t nPixelBytes = std::max(PixelBytes(oWriter), nSourceBytes);
     const std::uint64_t nBlockBytes = nPixelBytes * oWriter.GetTileWidth() * oWriter.GetTileHeight();
     PieceSize oSize{Stretch(oWriter.GetTileWidth(), nWidth, oWriter.GetWidth(), nBlockBytes), 1};
     oSize.height = Stretch(oWriter.GetTileHeight(), nHeight, oWriter.GetHeight(),
@@ -87,22 +89,20 @@ bool IsDirect(const CopySource& oSource, const IRasterWriter& oWriter)
     return true;
 }
 
-// Channels that are side by side in both places are copied in one go.
-void Place(const CopySource& oSource, const unsigned char* pPixels, Raster& oTarget)
+void MakeMerger(const std::vector<CopySource>& oSources, const IRasterWriter& oWriter,
+                std::optional<krv::raster::Merger>& oMerger)
 {
-    const auto eFrom = krv::gobs::QRFDataType2RasterBufferType(oSource.reader->GetDataType());
-    const auto eTo = krv::gobs::QRFDataType2RasterBufferType(oTarget.GetDataType());
-    const std::uint64_t nPixels = std::uint64_t{oTarget.GetWidth()} * oTarget.GetHeight();
-    const std::size_t nChannels = oSource.positions.size();
-    for (std::size_t nAt = 0, nRun = 1; nAt < nChannels; nAt += nRun)
+    std::vector<krv::raster::MergeSource> oBuffers;
+    std::vector<krv::raster::MergeChannel> oChannels(oWriter.GetChansCount());
+    for (unsigned int nSource = 0; nSource < oSources.size(); ++nSource)
     {
-        nRun = 1;
-        while (nAt + nRun < nChannels && oSource.positions[nAt + nRun] == oSource.positions[nAt] + nRun)
-            ++nRun;
-        krv::raster::CopyData(pPixels + krv::raster::BufferDataSize(eFrom, nAt), eFrom, nChannels,
-                              oTarget.GetBuffer() + krv::raster::BufferDataSize(eTo, oSource.positions[nAt]), eTo,
-                              oTarget.GetChansCount(), nPixels, static_cast<unsigned int>(nRun));
+        const CopySource& oSource = oSources[nSource];
+        oBuffers.push_back(
+            {krv::gobs::QRFDataType2RasterBufferType(oSource.reader->GetDataType()), oSource.reader->GetChansCount()});
+        for (unsigned int nChannel = 0; nChannel < oSource.positions.size(); ++nChannel)
+            oChannels.at(oSource.positions[nChannel]) = {nSource, nChannel};
     }
+    oMerger.emplace(oBuffers, krv::gobs::QRFDataType2RasterBufferType(oWriter.GetDataType()), oChannels);
 }
 
 } // namespace
@@ -114,10 +114,18 @@ void CopyPixels(const std::vector<CopySource>& oSources, IRasterWriter& oWriter,
     const std::uint64_t nPixels = std::uint64_t{oSize.width} * oSize.height;
     const bool bDirect = oSources.size() == 1 && IsDirect(oSources.front(), oWriter);
     const Buffer pTarget = Allocate(nPixels * PixelBytes(oWriter));
-    std::uint64_t nScratch = 0;
-    for (const CopySource& oSource : oSources)
-        nScratch = bDirect ? 0 : std::max(nScratch, nPixels * PixelBytes(*oSource.reader));
-    const Buffer pScratch = Allocate(nScratch);
+    std::optional<krv::raster::Merger> oMerger;
+    std::vector<Buffer> oBuffers;
+    std::vector<const unsigned char*> oParts;
+    if (!bDirect)
+    {
+        MakeMerger(oSources, oWriter, oMerger);
+        for (const CopySource& oSource : oSources)
+        {
+            oBuffers.push_back(Allocate(nPixels * PixelBytes(*oSource.reader)));
+            oParts.push_back(oBuffers.back().get());
+        }
+    }
     for (unsigned int nY = 0; nY < oWindow.height; nY += std::min(oSize.height, oWindow.height - nY))
     {
         for (unsigned int nX = 0; nX < oWindow.width; nX += std::min(oSize.width, oWindow.width - nX))
@@ -126,16 +134,16 @@ void CopyPixels(const std::vector<CopySource>& oSources, IRasterWriter& oWriter,
             const unsigned int nHeight = std::min(oSize.height, oWindow.height - nY);
             Raster oPiece(RasterInfo(nWidth, nHeight, oWriter.GetChansCount(), oWriter.GetDataType()),
                           RasterContext(static_cast<int>(nX), static_cast<int>(nY)), pTarget.get(), false);
-            for (const CopySource& oSource : oSources)
+            for (std::size_t nSource = 0; nSource < oSources.size(); ++nSource)
             {
-                Raster oPart(
-                    RasterInfo(nWidth, nHeight, oSource.reader->GetChansCount(), oSource.reader->GetDataType()),
-                    RasterContext(static_cast<int>(oWindow.x + nX), static_cast<int>(oWindow.y + nY)),
-                    bDirect ? pTarget.get() : pScratch.get(), false);
-                oSource.reader->ReadRaster(&oPart);
-                if (!bDirect)
-                    Place(oSource, oPart.GetBuffer(), oPiece);
+                IRasterReader& oReader = *oSources[nSource].reader;
+                Raster oPart(RasterInfo(nWidth, nHeight, oReader.GetChansCount(), oReader.GetDataType()),
+                             RasterContext(static_cast<int>(oWindow.x + nX), static_cast<int>(oWindow.y + nY)),
+                             bDirect ? pTarget.get() : oBuffers[nSource].get(), false);
+                oReader.ReadRaster(&oPart);
             }
+            if (oMerger)
+                oMerger->Run(oParts, oPiece.GetBuffer(), std::uint64_t{nWidth} * nHeight);
             oWriter.WriteRaster(&oPiece);
             oProgress.Advance(oPiece.GetBufferSize());
         }

@@ -5,9 +5,9 @@
 #include "datasources/reader/basicreader.h"
 #include "gobs/mask/mask.h"
 #include "tests/datasources/reader/readertest.h"
+#include "tests/support/facts.h"
 #include "toolkit/core/gglshape.h"
 
-#include <cstdlib>
 #include <cstring>
 #include <filesystem>
 
@@ -44,9 +44,7 @@ protected:
     // A copy of a real file, open for update; null without the data.
     std::unique_ptr<IDataset> OpenCopy(const std::string& name)
     {
-        const char* const pFolder = std::getenv("KRV_TEST_DATA");
-        const std::filesystem::path oSource =
-            std::filesystem::path(pFolder != nullptr ? pFolder : KRV_TEST_DATA) / name;
+        const std::filesystem::path oSource = std::filesystem::path(krv::test::DataFolder()) / name;
         moCopy = moHome.GetFolder().GetPath() + "/" + oSource.filename().string();
         if (!std::filesystem::exists(oSource))
             return nullptr;

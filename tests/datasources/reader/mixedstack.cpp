@@ -9,12 +9,12 @@
 #include "datasources/reader/multitypereader.h"
 #include "gobs/raster/raster.h"
 #include "tests/support/conversionmodel.h"
+#include "tests/support/facts.h"
 #include "tests/support/outputcapture.h"
 #include "tests/support/tempfolder.h"
 
 #include <gtest/gtest.h>
 
-#include <cstdlib>
 #include <filesystem>
 #include <memory>
 #include <string>
@@ -115,8 +115,7 @@ TEST(MixedStack, BoundaryValuesOfEveryTypeInEveryType)
 // Two files make a stack in a DEMO file, and a reader of their own readers.
 TEST(MixedStack, RealImagesOfTwoTypes)
 {
-    const char* const pFolder = std::getenv("KRV_TEST_DATA");
-    const std::string folder = pFolder != nullptr ? pFolder : KRV_TEST_DATA;
+    const std::string folder = krv::test::DataFolder();
     const std::string FILES[][2] = {
         {"/optical/tiny_LC81390452014295LGN00_B5.TIF", "/optical/tiny_LC81390452014295LGN00_B5_refl.TIF"},
         {"/nodata/test-200506000000_0_0.tiff", "/mask/image_rgb_mask.tif"}};

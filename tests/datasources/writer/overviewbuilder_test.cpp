@@ -4,6 +4,7 @@
 #include "datasources/writer/basicwriter.h"
 #include "datasources/writer/ioverviewwriteraccessor.h"
 #include "tests/datasources/reader/readertest.h"
+#include "tests/support/facts.h"
 
 #include <cmath>
 #include <cstring>
@@ -532,8 +533,7 @@ TEST_F(OverviewBuilderTest, CancelAndFailuresLeaveTheFileAsItWas)
 // A mask and levels of other sizes, as other programs leave them, and a real image's own no-data value.
 TEST_F(OverviewBuilderTest, RealFilesGetTheirLevels)
 {
-    const char* const pFolder = std::getenv("KRV_TEST_DATA");
-    const std::string folder = pFolder != nullptr ? pFolder : KRV_TEST_DATA;
+    const std::string folder = krv::test::DataFolder();
     const struct
     {
         const char* mpFile;
