@@ -30,7 +30,6 @@ install(FILES ${CMAKE_BINARY_DIR}/package/krvdatasourcesConfig.cmake
 configure_file(${CMAKE_CURRENT_LIST_DIR}/krvdatasources.pc.in ${CMAKE_BINARY_DIR}/package/krvdatasources.pc @ONLY)
 install(FILES ${CMAKE_BINARY_DIR}/package/krvdatasources.pc DESTINATION lib/pkgconfig)
 
-# For authors of format plug-ins: the conformance checks and the worked example.
-include(${CMAKE_SOURCE_DIR}/tests/conformance/kit/install.cmake OPTIONAL)
+# For authors of format plug-ins: the worked example; tools/conformance installs the conformance checks.
 install(FILES ${CMAKE_SOURCE_DIR}/examples/formatplugin/CMakeLists.txt DESTINATION share/krv/formatplugin)
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/plugins/demo DESTINATION share/krv/formatplugin/plugins)

@@ -1,6 +1,6 @@
-#include "tests/conformance/conformance.h"
+#include "tools/conformance/conformance.h"
 
-#include "tests/support/tempfolder.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
 
@@ -47,7 +47,7 @@ int RunProgram(const std::string& arguments)
 // Every check finds its faults, and a good plug-in passes them all.
 TEST(Conformance, ChecksFindWhatIsWrong)
 {
-    const krv::test::TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     const std::pair<const char*, std::vector<std::string>> FAULTS[] = {
         {"none", {}},
         {"lower-case name", {"description"}},
@@ -76,7 +76,7 @@ TEST(Conformance, ChecksFindWhatIsWrong)
 
 TEST(Conformance, TheProgramSaysHowItEnded)
 {
-    const krv::test::TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     const std::string sample = oFolder.Write("sample.sloppy", "SLOPPY, all of it\n");
     const std::string good = "--plugin " + Fixture("sloppy") + " --file " + sample;
     EXPECT_EQ(RunProgram(good), 0);

@@ -5,10 +5,10 @@
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/basicreader.h"
 #include "gobs/raster/raster.h"
-#include "tests/conformance/conformance.h"
 #include "tests/support/recipe.h"
-#include "tests/support/tempfolder.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "tools/conformance/conformance.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
 
@@ -23,7 +23,7 @@ namespace
 // What opening a DEMO file of these bytes throws, with FILE for its name; empty when it opens.
 std::string OpenError(const std::string& bytes)
 {
-    const krv::test::TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     const std::string file = oFolder.Write("image.demo", bytes);
     const krv::conformance::Plugin oPlugin(std::string(KRV_TEST_HOME) + "/lib/qrfformats/demo.so");
     try
@@ -77,7 +77,7 @@ TEST(DemoFormat, HeadersAreHostile)
 // As the application sees it: by name, through the manager.
 TEST(DemoFormat, PixelsOfChannelsOfSeveralTypes)
 {
-    const krv::test::TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     const std::string file = oFolder.Write("image.bin", "DEMO1\n2 1\n8U 16U 8U\n\n\1\2\3\4\5\6\7\10");
     BasicReader oReader(file, {3, 1});
     const std::unique_ptr<krv::gobs::Raster> oTile(oReader.GetRaster(0));
@@ -116,7 +116,7 @@ std::string ReadChannel(const std::string& file, unsigned int nChannel)
     return {reinterpret_cast<const char*>(oRaster->GetBuffer()), oRaster->GetBufferSize()};
 }
 
-long CountFiles(const krv::test::TempFolder& oFolder)
+long CountFiles(const krv::conformance::TempFolder& oFolder)
 {
     const std::filesystem::directory_iterator oFiles(std::filesystem::path(oFolder.File("x")).parent_path());
     return std::distance(begin(oFiles), end(oFiles));
@@ -126,7 +126,7 @@ long CountFiles(const krv::test::TempFolder& oFolder)
 
 TEST(DemoFormat, NewFilesOfMixedTypesAreThereWhenTheyAreWhole)
 {
-    const krv::test::TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     const std::string file = oFolder.Write("new.demo", "something of old");
     const std::vector<krv::gobs::DataType> TYPES = {krv::gobs::eDT_8U, krv::gobs::eDT_C16U, krv::gobs::eDT_64R};
     AuxiliaryData oTags(3);
@@ -172,7 +172,7 @@ TEST(DemoFormat, NewFilesOfMixedTypesAreThereWhenTheyAreWhole)
 
 TEST(DemoFormat, WhatCannotBeCreatedIsRefusedAndLeavesNothing)
 {
-    const krv::test::TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     const std::string file = oFolder.File("new.demo");
     EXPECT_THROW(NewDemo(file, "COMPRESS=ZSTD"), krv::DataException);
     const auto oDataset = NewDemo(file, " ");

@@ -9,13 +9,13 @@
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/ioverviewaccessor.h"
 #include "gobs/raster/raster.h"
-#include "tests/conformance/conformance.h"
 #include "tests/conformance/formattraits.h"
 #include "tests/conformance/tiffile.h"
 #include "tests/support/demofile.h"
 #include "tests/support/recipe.h"
-#include "tests/support/tempfolder.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "tools/conformance/conformance.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
 
@@ -107,7 +107,7 @@ protected:
         return ::testing::AssertionFailure() << "byte " << oPlaces.first - expected.begin() << " differs";
     }
 
-    krv::test::TempFolder moFolder;
+    krv::conformance::TempFolder moFolder;
 };
 
 } // namespace

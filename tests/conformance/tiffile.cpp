@@ -1,6 +1,7 @@
 #include "tests/conformance/tiffile.h"
 
 #include "tests/support/recipe.h"
+#include "tools/conformance/referenceimage.h"
 
 #include <tiffio.h>
 
@@ -73,7 +74,7 @@ void SetFields(TIFF* pFile, const Variant& oVariant, const krv::gobs::DataType& 
 }
 
 // All blocks of a plane, one after the other; those of tiles are filled up with zeros.
-void WritePlane(TIFF* pFile, const krv::test::ReferenceImage& oImage, bool bTiles, unsigned int& nBlock)
+void WritePlane(TIFF* pFile, const ReferenceImage& oImage, bool bTiles, unsigned int& nBlock)
 {
     const unsigned int nBlockWidth = bTiles ? 64 : oImage.mnWidth;
     const unsigned int nBlockHeight = bTiles ? 48 : 17;

@@ -1,7 +1,7 @@
 #include "tests/support/demofile.h"
 
 #include "tests/support/recipe.h"
-#include "tests/support/tempfolder.h"
+#include "tools/conformance/tempfolder.h"
 
 namespace krv::test
 {
@@ -18,7 +18,7 @@ void WriteDemoFile(const std::string& fileName, unsigned int nWidth, unsigned in
     bytes += "\n";
     for (unsigned int nChannel = 1; nChannel <= oTypes.size(); ++nChannel)
         bytes += RecipeImage(nWidth, nHeight, {nChannel}, oTypes[nChannel - 1]);
-    WriteFile(fileName, bytes);
+    krv::conformance::WriteFile(fileName, bytes);
 }
 
 } // namespace krv::test

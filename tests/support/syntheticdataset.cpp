@@ -6,10 +6,12 @@
 #include "gobs/raster/rasterinfo.h"
 #include "tests/support/recipe.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "tools/conformance/referenceimage.h"
 
 #include <algorithm>
 #include <cstring>
 
+using krv::conformance::ReferenceImage;
 using namespace krv::datasources;
 
 namespace krv::test

@@ -1,10 +1,10 @@
-#include "tests/support/tempfolder.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/xml/limits.h"
 #include "toolkit/xml/xmldocument.h"
 #include "toolkit/xml/xmlerror.h"
 #include "toolkit/xml/xmltree.h"
 #include "toolkit/xml/xmlutil.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -127,7 +127,7 @@ TEST(XmlTranscode, ReplacesWhatIsNotValid)
 
 TEST(XmlDocument, AnswersXPathsAfterMoving)
 {
-    const krv::test::TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     const std::string file =
         oFolder.Write("form\xC3\xA4t.xml", "<?xml version=\"1.0\"?>\n<Format><Object> tif </Object>"
                                            "<Capabilities><Dataset><SupportsCreate/></Dataset>"
@@ -141,7 +141,7 @@ TEST(XmlDocument, AnswersXPathsAfterMoving)
 
 TEST(XmlDocument, FailsWithTheParsersExceptionAndPrintsNothing)
 {
-    const krv::test::TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     ASSERT_EQ(::mkfifo(oFolder.File("pipe.xml").c_str(), 0600), 0);
     ::testing::internal::CaptureStderr();
     ::testing::internal::CaptureStdout();
@@ -176,7 +176,7 @@ TEST(XmlDocument, ExceptionOutlivesXmlSupport)
 
 TEST(XmlDocument, ReadsNothingOutsideAndDefinesNoEntities)
 {
-    const krv::test::TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     const std::string secret = oFolder.Write("secret.txt", "secret");
     const std::string external = "<!DOCTYPE a [<!ENTITY x SYSTEM \"" + secret + "\">]><a>&x;</a>";
     const std::string bomb = "<!DOCTYPE a [<!ENTITY b \"ha\"><!ENTITY c \"&b;&b;\">]><a>&c;</a>";

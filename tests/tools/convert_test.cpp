@@ -13,8 +13,8 @@
 #include "gobs/raster/raster.h"
 #include "tests/support/demofile.h"
 #include "tests/support/facts.h"
-#include "tests/support/tempfolder.h"
 #include "tests/tools/programrun.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
 
@@ -30,6 +30,7 @@ namespace krv::tool
 namespace
 {
 
+using krv::conformance::TempFolder;
 using krv::datasources::BasicReader;
 using krv::datasources::DatasetManager;
 using krv::datasources::IDataset;
@@ -37,7 +38,6 @@ using krv::test::DataFolder;
 using krv::test::Facts;
 using krv::test::ProgramRun;
 using krv::test::RunKrv;
-using krv::test::TempFolder;
 using nlohmann::json;
 
 using Texts = std::vector<std::string>;
@@ -315,18 +315,18 @@ TEST(Convert, FailuresLeaveNothingBehindAndTheOldFileAsItWas)
     // A file that ends in the middle of its pixels fails on the way.
     std::filesystem::resize_file(a, std::filesystem::file_size(a) - 900);
     ExpectFailure(RunConvert({a, out}), 1, "a.dem");
-    EXPECT_EQ(krv::test::ReadFile(out), "old");
+    EXPECT_EQ(krv::conformance::ReadFile(out), "old");
 
     const std::string large = oFolder.File("large.dem");
     krv::test::WriteDemoFile(large, 1, 1, {krv::gobs::eDT_64R});
-    std::string bytes = krv::test::ReadFile(large);
+    std::string bytes = krv::conformance::ReadFile(large);
     bytes.replace(bytes.find("1 1"), 3, "9000 9000");
-    krv::test::WriteFile(large, bytes);
+    krv::conformance::WriteFile(large, bytes);
     std::filesystem::resize_file(large, bytes.size() + std::uint64_t{9000} * 9000 * 8);
     const auto oStopped =
         krv::test::RunProgram(KRV_PROGRAM, {"convert", large, out, "--options", "COMPRESS=DEFLATE LEVEL=9"}, {}, 300);
     ExpectFailure(oStopped, 1, "stopped");
-    EXPECT_EQ(krv::test::ReadFile(out), "old");
+    EXPECT_EQ(krv::conformance::ReadFile(out), "old");
     EXPECT_EQ(std::distance(std::filesystem::directory_iterator(oFolder.GetPath()), {}), 4);
 }
 

@@ -9,11 +9,11 @@
 #include "tests/support/demofile.h"
 #include "tests/support/facts.h"
 #include "tests/support/recipe.h"
-#include "tests/support/tempfolder.h"
 #include "tests/tools/programrun.h"
 #include "toolkit/ogc/cs/coordinatetransformation.h"
 #include "toolkit/ogc/cs/crsfactory.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
 #include <png.h>
@@ -29,11 +29,11 @@ namespace krv::tool
 namespace
 {
 
+using krv::conformance::TempFolder;
 using krv::datasources::BasicReader;
 using krv::datasources::IDataset;
 using krv::test::ProgramRun;
 using krv::test::RunKrv;
-using krv::test::TempFolder;
 using nlohmann::json;
 
 constexpr unsigned int WIDTH = 791;
@@ -48,7 +48,7 @@ protected:
         const std::string source = krv::test::DataFolder() + "/optical/rgb_deflate.tif";
         if (!std::filesystem::exists(source))
             GTEST_SKIP() << "no " << source;
-        krv::test::WriteFile(moFile, krv::test::ReadFile(source));
+        krv::conformance::WriteFile(moFile, krv::conformance::ReadFile(source));
     }
 
     std::unique_ptr<IDataset> Open() const
@@ -130,7 +130,7 @@ TEST_F(MaskCommand, PolygonsMeanTheSamePixelsInEveryReferenceSystem)
                               {"geometries",
                                {{{"type", "Point"}, {"coordinates", {1, 2}}},
                                 {{"type", "MultiPolygon"}, {"coordinates", {oGeoJson}}}}}}}}}}};
-    krv::test::WriteFile(moFolder.File("zones.geojson"), oFeatures.dump());
+    krv::conformance::WriteFile(moFolder.File("zones.geojson"), oFeatures.dump());
     const std::string expected = Written({"--polygon", pixels + ")", "--coordinates", "pixel"});
     EXPECT_GT(moReport["set"], 200000);
     EXPECT_EQ(moReport["set"], std::count(expected.begin(), expected.end(), '\1'));
@@ -239,7 +239,7 @@ TEST_F(MaskCommand, FailuresSayWhyOnOneLineAndChangeNothing)
 {
     const std::string demo = moFolder.File("plain.demo"), picture = moFolder.GetPath() + "/none/mask.png";
     krv::test::WriteDemoFile(demo, 8, 8, {krv::gobs::eDT_8U});
-    const std::string before = krv::test::ReadFile(moFile);
+    const std::string before = krv::conformance::ReadFile(moFile);
     const std::string square = "POLYGON((0 0,5 0,5 5,0 5))";
     struct Case
     {
@@ -287,7 +287,7 @@ TEST_F(MaskCommand, FailuresSayWhyOnOneLineAndChangeNothing)
         EXPECT_NE(oRun.errors.find(oCase.words), std::string::npos) << oCase.words << " is not in " << oRun.errors;
         EXPECT_EQ(std::count(oRun.errors.begin(), oRun.errors.end(), '\n'), 1) << oRun.errors;
         EXPECT_TRUE(oRun.output.empty());
-        ASSERT_TRUE(krv::test::ReadFile(moFile) == before) << oCase.words;
+        ASSERT_TRUE(krv::conformance::ReadFile(moFile) == before) << oCase.words;
     }
 }
 

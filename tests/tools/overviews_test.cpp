@@ -1,7 +1,7 @@
 // krv overviews as users run it.
 
-#include "tests/support/tempfolder.h"
 #include "tests/tools/programrun.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
 #include <tiffio.h>
@@ -15,11 +15,11 @@ namespace krv::tool
 namespace
 {
 
+using krv::conformance::ReadFile;
+using krv::conformance::TempFolder;
 using krv::test::ProgramRun;
-using krv::test::ReadFile;
 using krv::test::RunKrv;
 using krv::test::RunProgram;
-using krv::test::TempFolder;
 
 // One 8-bit channel in strips of 16 rows, as libtiff alone writes it.
 std::string MakeFile(const TempFolder& oFolder, unsigned int nSize, bool bTable)

@@ -2,8 +2,8 @@
 
 #include "tests/support/demofile.h"
 #include "tests/support/recipe.h"
-#include "tests/support/tempfolder.h"
 #include "tests/tools/programrun.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
 #include <png.h>
@@ -21,10 +21,10 @@ namespace krv::tool
 namespace
 {
 
+using krv::conformance::TempFolder;
 using krv::test::ProgramRun;
 using krv::test::RunKrv;
 using krv::test::RunProgram;
-using krv::test::TempFolder;
 using nlohmann::json;
 
 // A sample scene of 300 pixels, made once.
@@ -178,7 +178,7 @@ TEST(Command, ErrorsNameFileCauseAndRemedy)
 {
     const TempFolder oFolder;
     const std::string text = oFolder.Write("notes.txt", "hello");
-    const std::string scene = krv::test::ReadFile(SceneFolder() + "/rgb.tif");
+    const std::string scene = krv::conformance::ReadFile(SceneFolder() + "/rgb.tif");
     const std::string cut = oFolder.Write("cut.tif", scene.substr(0, scene.size() / 2));
     ExpectFailure(RunKrv({"info", oFolder.File("none.tif")}), 1, {"none.tif", "no such file", "check"});
     ExpectFailure(RunKrv({"stats", oFolder.GetPath()}), 1, {oFolder.GetPath(), "folder"});

@@ -1,6 +1,6 @@
 #include "tests/tools/programrun.h"
 
-#include "tests/support/tempfolder.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <fcntl.h>
 #include <spawn.h>
@@ -16,6 +16,8 @@ extern char** environ;
 
 namespace krv::test
 {
+
+using krv::conformance::ReadFile;
 
 namespace
 {
@@ -34,7 +36,7 @@ std::vector<char*> Pointers(std::vector<std::string>& oTexts)
 ProgramRun RunProgram(const std::string& program, const std::vector<std::string>& oArguments,
                       const std::vector<std::string>& oEnvironment, unsigned int nInterruptAfterMs)
 {
-    const TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     const std::string output = oFolder.File("output"), errors = oFolder.File("errors");
     posix_spawn_file_actions_t oActions;
     posix_spawn_file_actions_init(&oActions);

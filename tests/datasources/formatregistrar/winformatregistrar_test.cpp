@@ -5,11 +5,11 @@
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/reader/basicreader.h"
 #include "gobs/raster/raster.h"
-#include "tests/support/formathome.h"
 #include "tests/support/outputcapture.h"
 #include "toolkit/core/core.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/xml/xmlerror.h"
+#include "tools/conformance/formathome.h"
 
 #include <gtest/gtest.h>
 
@@ -19,7 +19,7 @@
 #include <filesystem>
 
 using namespace krv::datasources;
-using krv::test::FormatHome;
+using krv::conformance::FormatHome;
 
 namespace
 {

@@ -1,11 +1,11 @@
 #include "datasources/iomanager/datasetmanager.h"
 
 #include "datasources/iomanager/formatcapabilities.h"
-#include "tests/support/formathome.h"
 #include "tests/support/probe.h"
 #include "tests/support/syntheticdataset.h"
 #include "toolkit/core/core.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "tools/conformance/formathome.h"
 
 #include <gtest/gtest.h>
 
@@ -68,7 +68,7 @@ protected:
     }
 
     krv::test::Probe moProbe; // outlives the manager's builders
-    krv::test::FormatHome moHome;
+    krv::conformance::FormatHome moHome;
 };
 
 template <class Kind, class Operation>

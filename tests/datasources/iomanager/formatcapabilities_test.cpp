@@ -2,9 +2,9 @@
 
 #include "datasources/iomanager/xalanselect.h"
 #include "tests/support/outputcapture.h"
-#include "tests/support/tempfolder.h"
 #include "toolkit/xml/xmldocument.h"
 #include "toolkit/xml/xmlutil.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
 
@@ -31,7 +31,7 @@ constexpr char DESCRIPTION[] = R"(<?xml version="1.0"?>
 
 TEST(FormatCapabilities, PresenceAloneCounts)
 {
-    const krv::test::TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     const FormatCapabilities oCapabilities(oFolder.Write("format.xml", DESCRIPTION));
     EXPECT_TRUE(oCapabilities.IsSupported(CAPABILITY_CREATE)); // although it says no
     EXPECT_TRUE(oCapabilities.IsSupported(CAPABILITY_GEOREFERENCING));
@@ -47,7 +47,7 @@ TEST(FormatCapabilities, PresenceAloneCounts)
 
 TEST(FormatCapabilities, Limits)
 {
-    const krv::test::TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     const FormatCapabilities oCapabilities(oFolder.Write("format.xml", DESCRIPTION));
     const std::pair<const char*, unsigned long long> LIMITS[] = {{"A", 42},       {"B", 18446744073709551614ull},
                                                                  {"C", NO_LIMIT}, {"D", NO_LIMIT},
@@ -59,7 +59,7 @@ TEST(FormatCapabilities, Limits)
 
 TEST(FormatCapabilities, FailuresAreDebugOutputAndNo)
 {
-    const krv::test::TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     const std::string good = oFolder.Write("format.xml", DESCRIPTION);
     const std::string broken = oFolder.Write("broken.xml", "<Format><Capabilities>");
     const std::pair<std::string, std::string> FAILING[] = {

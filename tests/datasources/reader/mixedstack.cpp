@@ -11,7 +11,7 @@
 #include "tests/support/conversionmodel.h"
 #include "tests/support/facts.h"
 #include "tests/support/outputcapture.h"
-#include "tests/support/tempfolder.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
 
@@ -101,7 +101,7 @@ TEST(MixedStack, BoundaryValuesOfEveryTypeInEveryType)
         oNumbers.push_back(nPosition % 15 + 1);
         oExpected.push_back(&oChannels[nPosition % 15]);
     }
-    const krv::test::TempFolder oFolder;
+    const krv::conformance::TempFolder oFolder;
     const std::string file = oFolder.File("stack.demo");
     WriteStack(file, WIDTH, HEIGHT, oChannels);
     const krv::test::OutputCapture oOutput; // most of these types lose something
@@ -136,7 +136,7 @@ TEST(MixedStack, RealImagesOfTwoTypes)
             oChannels.push_back({oReader.GetDataType().GetNativeCode(),
                                  Bytes(oRaster->GetBuffer(), oRaster->GetBuffer() + oRaster->GetBufferSize())});
         }
-        const krv::test::TempFolder oFolder;
+        const krv::conformance::TempFolder oFolder;
         const std::string stack = oFolder.File("stack.demo");
         WriteStack(stack, nWidth, nHeight, oChannels);
         const std::vector<const Channel*> oExpected = {&oChannels[0], &oChannels[1]};

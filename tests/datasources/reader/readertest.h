@@ -9,16 +9,19 @@
 #include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/reader/rasteriterator.h"
 #include "gobs/raster/raster.h"
-#include "tests/support/formathome.h"
 #include "tests/support/probe.h"
 #include "tests/support/recipe.h"
 #include "tests/support/syntheticdataset.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "tools/conformance/formathome.h"
+#include "tools/conformance/referenceimage.h"
 
 #include <gtest/gtest.h>
 
 namespace krv::test
 {
+
+using namespace krv::conformance;
 
 using Channels = std::vector<unsigned int>;
 using RasterPtr = std::unique_ptr<krv::gobs::Raster>;

@@ -5,7 +5,7 @@
 #include "gobs/raster/datatype.h"
 #include "plugins/tif/tifbuilder.h"
 #include "plugins/tif/tifdataset.h"
-#include "tests/support/tempfolder.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <cstdint>
 #include <memory>
@@ -15,6 +15,8 @@
 
 namespace krv::test
 {
+
+using namespace krv::conformance;
 
 using Bytes = std::vector<unsigned char>;
 using TifPointer = std::unique_ptr<krv::plugins::tif::TifDataset>;

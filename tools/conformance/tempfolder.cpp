@@ -1,4 +1,4 @@
-#include "tests/support/tempfolder.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <cstdlib>
 #include <filesystem>
@@ -7,7 +7,7 @@
 #include <stdexcept>
 #include <system_error>
 
-namespace krv::test
+namespace krv::conformance
 {
 
 TempFolder::TempFolder() : moPath((std::filesystem::temp_directory_path() / "krvtest.XXXXXX").string())
@@ -52,4 +52,4 @@ void WriteFile(const std::string& fileName, const std::string& bytes)
         throw std::runtime_error("cannot write " + fileName);
 }
 
-} // namespace krv::test
+} // namespace krv::conformance

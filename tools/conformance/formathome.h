@@ -1,10 +1,10 @@
 #pragma once
 
-#include "tests/support/tempfolder.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <string>
 
-namespace krv::test
+namespace krv::conformance
 {
 
 // A home of the framework in a temporary folder: KRVHOME names it while the object lives. The dataset manager is ended
@@ -33,4 +33,4 @@ private:
     bool mbHadHome;
 };
 
-} // namespace krv::test
+} // namespace krv::conformance

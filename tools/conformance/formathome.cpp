@@ -1,4 +1,4 @@
-#include "tests/support/formathome.h"
+#include "tools/conformance/formathome.h"
 
 #include "datasources/iomanager/datasetmanager.h"
 
@@ -7,7 +7,7 @@
 
 using krv::datasources::DatasetManager;
 
-namespace krv::test
+namespace krv::conformance
 {
 
 FormatHome::FormatHome()
@@ -57,4 +57,4 @@ std::string FormatHome::GetDescriptionPath(const std::string& name) const
     return moFolder.File("etc/qrfformats/" + name + ".xml");
 }
 
-} // namespace krv::test
+} // namespace krv::conformance

@@ -1,4 +1,4 @@
-#include "tests/conformance/conformance.h"
+#include "tools/conformance/conformance.h"
 
 #include "datasources/interfaces/formatplugin.h"
 #include "datasources/interfaces/ibitmapdataset.h"
@@ -15,11 +15,11 @@
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/rasterrange.h"
 #include "gobs/pct/pct.h"
-#include "tests/support/formathome.h"
-#include "tests/support/recipe.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 #include "toolkit/ogc/cs/icrs.h"
+#include "tools/conformance/formathome.h"
+#include "tools/conformance/referenceimage.h"
 
 #include <dlfcn.h>
 
@@ -36,7 +36,6 @@
 #include <stdexcept>
 
 using namespace krv::datasources;
-using krv::test::ReferenceImage;
 
 namespace krv::conformance
 {
@@ -266,7 +265,7 @@ int Identify(const Plugin& oPlugin, const std::string& file, const std::string& 
 
 void CheckIdentify(const Plugin& oPlugin, const std::string& sample, Findings& oFindings)
 {
-    const std::string own = Padded(krv::test::ReadFile(sample).substr(0, HEADER_LENGTH));
+    const std::string own = Padded(ReadFile(sample).substr(0, HEADER_LENGTH));
     const std::vector<std::string> oExtensions = oPlugin.GetBuilder().GetFileFormat()->GetExtensions();
     const std::string otherName = "another." + (oExtensions.empty() ? "bin" : oExtensions[0]);
     for (int nTime = 0; nTime < 2; ++nTime)
@@ -312,7 +311,7 @@ std::size_t CountDescriptors()
 // The most memory that the process has held, in bytes.
 std::uint64_t PeakMemory()
 {
-    std::istringstream oStatus(krv::test::ReadFile("/proc/self/status"));
+    std::istringstream oStatus(ReadFile("/proc/self/status"));
     for (std::string word; oStatus >> word;)
     {
         std::uint64_t nKilobytes = 0;
@@ -371,8 +370,8 @@ void TryDamaged(const Plugin& oPlugin, const std::string& file, const std::strin
 
 void CheckTruncated(const Plugin& oPlugin, const std::string& sample, Findings& oFindings)
 {
-    const krv::test::TempFolder oFolder;
-    const std::string file = oFolder.Write("cut", krv::test::ReadFile(sample));
+    const TempFolder oFolder;
+    const std::string file = oFolder.Write("cut", ReadFile(sample));
     const std::size_t nDescriptors = CountDescriptors();
     for (std::uint64_t nBytes = std::filesystem::file_size(file); nBytes > 0;)
     {
@@ -385,8 +384,8 @@ void CheckTruncated(const Plugin& oPlugin, const std::string& sample, Findings& 
 
 void CheckDamaged(const Plugin& oPlugin, const std::string& sample, Findings& oFindings)
 {
-    const krv::test::TempFolder oFolder;
-    const std::string bytes = krv::test::ReadFile(sample);
+    const TempFolder oFolder;
+    const std::string bytes = ReadFile(sample);
     const std::string file = oFolder.Write("damaged", bytes);
     const std::size_t nDescriptors = CountDescriptors();
     for (unsigned int nSeed = 0; nSeed < 400; ++nSeed)
@@ -684,7 +683,7 @@ std::string ReadFirstChannel(IDataset& oDataset)
 
 void CheckLife(const Plugin& oPlugin, const std::string& sample, Findings& oFindings)
 {
-    const std::string bytes = krv::test::ReadFile(sample);
+    const std::string bytes = ReadFile(sample);
     const std::string pixels = ReadFirstChannel(*Open(oPlugin, sample));
     const std::size_t nDescriptors = CountDescriptors();
     {
@@ -715,14 +714,14 @@ void CheckLife(const Plugin& oPlugin, const std::string& sample, Findings& oFind
         oThreads.push_back(std::async(std::launch::async, [&oDataset] { return ReadFirstChannel(*oDataset); }));
     for (auto& oThread : oThreads)
         Expect(oFindings, oThread.get() == pixels, "datasets in several threads disturb each other");
-    Expect(oFindings, krv::test::ReadFile(sample) == bytes, "reading changed the file");
+    Expect(oFindings, ReadFile(sample) == bytes, "reading changed the file");
     const std::string missing = sample + ".missing";
     Expect(oFindings, Throws([&] { Open(oPlugin, missing); }), "a missing file is opened");
 }
 
 void CheckReader(const Plugin& oPlugin, const std::string& sample, Findings& oFindings)
 {
-    krv::test::FormatHome oHome;
+    FormatHome oHome;
     oHome.Add(oPlugin.GetLibraryFile());
     const DatasetPtr oDataset(DatasetManager::GetInstance()->Open(sample, eReadOnly));
     Expect(oFindings, oDataset != nullptr, "the manager opens null");

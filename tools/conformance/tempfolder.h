@@ -2,7 +2,7 @@
 
 #include <string>
 
-namespace krv::test
+namespace krv::conformance
 {
 
 // A folder of its own below the system's temporary one, removed with all that is in it.
@@ -28,4 +28,4 @@ private:
 std::string ReadFile(const std::string& fileName);
 void WriteFile(const std::string& fileName, const std::string& bytes);
 
-} // namespace krv::test
+} // namespace krv::conformance

@@ -1,4 +1,4 @@
-#include "tests/conformance/conformance.h"
+#include "tools/conformance/conformance.h"
 
 #include <cstdio>
 #include <cstring>
