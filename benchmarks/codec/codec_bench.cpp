@@ -1,6 +1,7 @@
 // Measures the block codecs on tiles of 256 x 256 in memory, one thread. Each decoding is compared with the image
 // first.
 
+#include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "plugins/support/codec/bits.h"
 #include "plugins/support/codec/deflatedecoder.h"
@@ -340,18 +341,19 @@ void MeasureCodings(const std::string& filter)
 } // namespace
 
 // Without arguments everything; otherwise one of lzw, deflate, zstd, predictors, channels, bits.
-int main(int nArguments, char** arguments)
+int main(int nArguments, char** pArguments)
 {
+    const krv::benchmarks::Arguments oArguments(nArguments, pArguments,
+                                                "[--only lzw|deflate|zstd|predictors|channels|bits]");
     TIFFSetWarningHandler(nullptr);
-    const std::string filter = nArguments > 1 ? arguments[1] : "";
     Bytes oFrom(TILE * TILE * 9 * 8, 3), oTo(TILE * TILE * 9 * 8, 5);
-    if (filter.empty() || filter == "lzw" || filter == "deflate" || filter == "zstd")
-        MeasureCodings(filter);
-    if (filter.empty() || filter == "predictors")
+    if (oArguments.Wants("lzw") || oArguments.Wants("deflate") || oArguments.Wants("zstd"))
+        MeasureCodings(oArguments.GetOption("only"));
+    if (oArguments.Wants("predictors"))
         MeasurePredictors(oFrom, oTo);
-    if (filter.empty() || filter == "channels")
+    if (oArguments.Wants("channels"))
         MeasureChannels(oFrom, oTo);
-    if (filter.empty() || filter == "bits")
+    if (oArguments.Wants("bits"))
         MeasureBits(oFrom, oTo);
     return 0;
 }

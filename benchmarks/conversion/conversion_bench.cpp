@@ -2,6 +2,7 @@
 // 128 KiB (second), 2 MiB (third) and 96 MiB (memory).
 //     krv_bench_conversion [--only convert|merge|stride] [--match TEXT]
 
+#include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "toolkit/core/hmalloc.h"
 #include "toolkit/raster/copydata.h"
@@ -186,13 +187,11 @@ const Strides STRIDES[] = {
 
 int main(int nArguments, char** sArguments)
 {
-    std::string only;
-    std::string match;
-    for (int i = 1; i + 1 < nArguments; i += 2)
-        (std::string(sArguments[i]) == "--only" ? only : match) = sArguments[i + 1];
+    const Arguments oArguments(nArguments, sArguments, "[--only convert|merge|stride] [--match TEXT]");
+    const std::string match = oArguments.GetOption("match");
     const auto oMeasureAll = [&](const char* sPart, const char* sTitle, const auto& oWorkloads, auto Work)
     {
-        if (!only.empty() && only != sPart)
+        if (!oArguments.Wants(sPart))
             return;
         PrintHeading(sTitle);
         for (const auto& oWorkload : oWorkloads)

@@ -1,6 +1,7 @@
 // Measures raster allocation against reused buffers, margins and masks against memcpy of the tile.
 //     krv_bench_gobs [--only memory|margins|masks]
 
+#include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "gobs/mask/mask.h"
 #include "gobs/raster/margins.h"
@@ -264,11 +265,11 @@ void MeasureMasks()
 
 int main(int nArguments, char** sArguments)
 {
-    const std::string sOnly = nArguments > 2 && std::string(sArguments[1]) == "--only" ? sArguments[2] : "";
-    if (sOnly.empty() || sOnly == "memory")
+    const Arguments oArguments(nArguments, sArguments, "[--only memory|margins|masks]");
+    if (oArguments.Wants("memory"))
         MeasureMemory();
-    if (sOnly.empty() || sOnly == "margins")
+    if (oArguments.Wants("margins"))
         MeasureAllMargins();
-    if (sOnly.empty() || sOnly == "masks")
+    if (oArguments.Wants("masks"))
         MeasureMasks();
 }

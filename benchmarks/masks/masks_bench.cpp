@@ -4,6 +4,7 @@
 
 #include "benchmarks/masks/bitrun.h"
 #include "benchmarks/masks/otherrasterisers.h"
+#include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "benchmarks/support/scene.h"
 #include "datasources/interfaces/ibitmapdataset.h"
@@ -223,20 +224,13 @@ void MeasureBitmaps(const std::string& folder)
 int main(int nArguments, char** pArguments)
 try
 {
-    std::string folder = "build/bench", only;
-    for (int i = 1; i < nArguments; ++i)
-    {
-        const std::string argument = pArguments[i];
-        if (argument == "--only" && i + 1 < nArguments)
-            only = pArguments[++i];
-        else
-            folder = argument;
-    }
-    if (only.empty() || only == "rings")
+    const Arguments oArguments(nArguments, pArguments, "[FOLDER] [--only rings|stars|bitmaps]");
+    const std::string folder = oArguments.GetWords().empty() ? "build/bench" : oArguments.GetWords().front();
+    if (oArguments.Wants("rings"))
         MeasurePolygons("ring", &Ring);
-    if (only.empty() || only == "stars")
+    if (oArguments.Wants("stars"))
         MeasurePolygons("star", &Star);
-    if (only.empty() || only == "bitmaps")
+    if (oArguments.Wants("bitmaps"))
         MeasureBitmaps(folder);
     return 0;
 }

@@ -1,6 +1,7 @@
 // Measures no-data masks against memcpy of the same tiles, and how work on metadata tags grows with their number.
 //     krv_bench_metadata [--only masks|tags]
 
+#include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/metadata/metadatafilters.h"
@@ -204,9 +205,9 @@ void MeasureTags()
 
 int main(int nArguments, char** pArguments)
 {
-    const std::string only = nArguments == 3 && std::string(pArguments[1]) == "--only" ? pArguments[2] : "";
-    if (only.empty() || only == "masks")
+    const Arguments oArguments(nArguments, pArguments, "[--only masks|tags]");
+    if (oArguments.Wants("masks"))
         MeasureAllMasks();
-    if (only.empty() || only == "tags")
+    if (oArguments.Wants("tags"))
         MeasureTags();
 }

@@ -1,8 +1,9 @@
 // Measures reading a stack of images of different types as one type against reading the groups of one type by
 // themselves, tile by tile: through readers of the files, and from a DEMO file that the stack is written to.
-//     krv_bench_mixed FOLDER [FILE FILE...]
+//     krv_bench_mixed FOLDER [FILE...]
 // The files are images of one size, made ones by default; FOLDER takes them and the stack.
 
+#include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "benchmarks/support/scene.h"
 #include "datasources/interfaces/idataset.h"
@@ -142,17 +143,14 @@ void MeasureFiles(IDataset& oDataset, const std::vector<Layer>& oLayers, const D
 
 int main(int nArguments, char** pArguments)
 {
-    if (nArguments < 2)
-    {
-        std::fprintf(stderr, "usage: krv_bench_mixed FOLDER [FILE FILE...]\n");
-        return 2;
-    }
-    const std::string stack = std::string(pArguments[1]) + "/stack.demo";
-    std::filesystem::create_directories(pArguments[1]);
-    std::vector<std::string> oFiles(pArguments + 2, pArguments + nArguments);
+    const Arguments oArguments(nArguments, pArguments, "FOLDER [FILE...]");
+    const std::string& folder = oArguments.GetWords().front();
+    const std::string stack = folder + "/stack.demo";
+    std::filesystem::create_directories(folder);
+    std::vector<std::string> oFiles(oArguments.GetWords().begin() + 1, oArguments.GetWords().end());
     if (oFiles.empty())
         for (const SceneKind& oKind : {SceneKind{"3x8U", 3, 8, false}, SceneKind{"1x16U", 1, 16, false}})
-            oFiles.push_back(MakeScene(pArguments[1], oKind, "deflate", 256, 2048).moPath);
+            oFiles.push_back(MakeScene(folder, oKind, "deflate", 256, 2048).moPath);
     const std::vector<Layer> oLayers = FindLayers(oFiles);
     WriteStack(stack, oLayers);
     const std::unique_ptr<IDataset> oDataset(DatasetManager::GetInstance()->Open(oLayers.front().moFile, eReadOnly));

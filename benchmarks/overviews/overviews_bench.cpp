@@ -1,7 +1,9 @@
 // Building levels 2 to 32 by average, against straight code over the tiles of libtiff and against the pyramid of
 // libvips; averaging alone against reading the source once; memory. Usage: krv_bench_overviews FOLDER [--size N]
+// N is a multiple of 8192.
 
 #include "benchmarks/overviews/byhand.h"
+#include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/iomanager/datasetmanager.h"
@@ -258,18 +260,14 @@ int main(int nArguments, char** pArguments)
 {
     if (nArguments == 3 && std::strcmp(pArguments[1], "--child") == 0)
         return BeChild(pArguments[2]);
-    if (nArguments != 2 && !(nArguments == 4 && std::strcmp(pArguments[2], "--size") == 0))
-    {
-        std::fprintf(stderr, "usage: krv_bench_overviews FOLDER [--size N]: N is a multiple of 8192\n");
-        return 2;
-    }
+    const Arguments oArguments(nArguments, pArguments, "FOLDER [--size N]");
 #if defined(KRV_HAVE_VIPS)
     if (VIPS_INIT(pArguments[0]) != 0)
         return 1;
 #endif
-    const std::string folder = pArguments[1];
+    const std::string& folder = oArguments.GetWords().front();
     std::filesystem::create_directories(folder);
-    const unsigned int nSize = nArguments == 4 ? static_cast<unsigned int>(std::atoi(pArguments[3])) : 8192;
+    const unsigned int nSize = oArguments.GetNumber("size", 8192);
     const SceneFile oScene = MakeScene(folder, {"8U x 3", 3, 8, false}, "none", 256, nSize);
 
     PrintHeading("Averaging in memory, against reading the source once");

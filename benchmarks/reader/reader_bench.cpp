@@ -1,8 +1,9 @@
 // Measures reading through the library against the raw libraries underneath, in one process and interleaved rounds.
-//     krv_bench_reader FOLDER [--size N] [--only WORD]
+//     krv_bench_reader FOLDER [--size N] [--only tiles|margins|windows|memory|threads|process]
 // FOLDER takes the scenes (some gigabytes at the full size of 8192) and keeps them for the next run.
 
 #include "benchmarks/reader/byhand.h"
+#include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "benchmarks/support/scene.h"
 #include "datasources/interfaces/idataset.h"
@@ -40,8 +41,7 @@ constexpr unsigned long long BYTES_A_PASS = 192ull << 20;
 struct Settings
 {
     std::string moFolder;
-    unsigned int mnSize = 8192;
-    std::string moOnly;
+    unsigned int mnSize;
     std::string moSelf;
 };
 
@@ -393,19 +393,15 @@ double GoalOf(const std::string& codec)
     return codec == "lzw" ? 0.9 : 0.95;
 }
 
-void MeasureAll(const Settings& oSettings)
+void MeasureAll(const Settings& oSettings, const Arguments& oArguments)
 {
-    const auto bWanted = [&](const char* pWord)
-    {
-        return oSettings.moOnly.empty() || oSettings.moOnly == pWord;
-    };
     const auto oMake = [&](const SceneKind& oKind, const char* pCodec, unsigned int nTile)
     {
         return MakeScene(oSettings.moFolder, oKind, pCodec, nTile, oSettings.mnSize);
     };
     const char* const CODECS[] = {"none", "deflate", "lzw", "zstd"};
 
-    if (bWanted("tiles"))
+    if (oArguments.Wants("tiles"))
     {
         PrintHeading("Tiles, against straight code over the codec libraries");
         for (const char* pCodec : CODECS)
@@ -413,7 +409,7 @@ void MeasureAll(const Settings& oSettings)
                 for (const unsigned int nTile : {256u, 512u})
                     MeasureTiles(oMake(oKind, pCodec, nTile), GoalOf(pCodec));
     }
-    if (bWanted("margins"))
+    if (oArguments.Wants("margins"))
     {
         PrintHeading("Margins, per byte delivered against the same run without margins");
         for (const char* pCodec : CODECS)
@@ -421,7 +417,7 @@ void MeasureAll(const Settings& oSettings)
                 for (const unsigned int nMargin : {8u, 32u})
                     MeasureMargins(oMake(oKind, pCodec, 256), nMargin, std::strcmp(pCodec, "none") == 0 ? 0.6 : 0.95);
     }
-    if (bWanted("windows"))
+    if (oArguments.Wants("windows"))
     {
         PrintHeading("1,000 random windows of 300 x 300");
         MeasureWindowsOfMapping(oMake(KINDS[0], "none", 256));
@@ -429,18 +425,18 @@ void MeasureAll(const Settings& oSettings)
         MeasureWindowsOfLibtiff(oMake(KINDS[0], "deflate", 256));
         MeasureWindowsOfLibtiff(oMake(KINDS[1], "deflate", 256));
     }
-    if (bWanted("memory"))
+    if (oArguments.Wants("memory"))
     {
         PrintHeading("Raster memory, filling against reused buffers");
         MeasureEightRasters();
     }
-    if (bWanted("threads"))
+    if (oArguments.Wants("threads"))
     {
         PrintHeading("Threads");
         for (const char* pCodec : CODECS)
             MeasureTwoThreads(oMake(KINDS[0], pCodec, 256));
     }
-    if (bWanted("process"))
+    if (oArguments.Wants("process"))
     {
         PrintHeading("Start, opening, memory");
         MeasureProcess(oSettings);
@@ -454,23 +450,11 @@ int main(int nArguments, char** pArguments)
 {
     if (nArguments == 4 && std::strcmp(pArguments[1], "--child") == 0)
         return BeChild(pArguments[2], pArguments[3]);
-    if (nArguments < 2 || pArguments[1][0] == '-')
-    {
-        std::fprintf(stderr, "usage: krv_bench_reader FOLDER [--size N] [--only tiles|margins|windows|memory|threads|"
-                             "process]\n");
-        return 2;
-    }
-    Settings oSettings;
-    oSettings.moFolder = pArguments[1];
-    oSettings.moSelf = std::filesystem::read_symlink("/proc/self/exe").string();
-    for (int n = 2; n + 1 < nArguments; n += 2)
-    {
-        if (std::strcmp(pArguments[n], "--size") == 0)
-            oSettings.mnSize = static_cast<unsigned int>(std::atoi(pArguments[n + 1]));
-        else if (std::strcmp(pArguments[n], "--only") == 0)
-            oSettings.moOnly = pArguments[n + 1];
-    }
+    const Arguments oArguments(nArguments, pArguments,
+                               "FOLDER [--size N] [--only tiles|margins|windows|memory|threads|process]");
+    const Settings oSettings{oArguments.GetWords().front(), oArguments.GetNumber("size", 8192),
+                             std::filesystem::read_symlink("/proc/self/exe").string()};
     std::filesystem::create_directories(oSettings.moFolder);
-    MeasureAll(oSettings);
+    MeasureAll(oSettings, oArguments);
     return 0;
 }

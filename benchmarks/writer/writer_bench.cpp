@@ -3,6 +3,7 @@
 //     krv_bench_writer FOLDER [--size N] [--only none|deflate|zstd]
 // FOLDER keeps the scene for the next run; the files that are written in it are removed.
 
+#include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "benchmarks/support/scene.h"
 #include "datasources/interfaces/idataset.h"
@@ -325,21 +326,9 @@ void Measure(Pixels& oPixels, const std::string& codecName, const std::string& f
 
 int main(int nArguments, char** pArguments)
 {
-    if (nArguments < 2 || pArguments[1][0] == '-')
-    {
-        std::fprintf(stderr, "usage: krv_bench_writer FOLDER [--size N] [--only none|deflate|zstd]\n");
-        return 2;
-    }
-    const std::string folder = pArguments[1];
-    unsigned int nSize = 8192;
-    std::string only;
-    for (int n = 2; n + 1 < nArguments; n += 2)
-    {
-        if (std::strcmp(pArguments[n], "--size") == 0)
-            nSize = static_cast<unsigned int>(std::atoi(pArguments[n + 1])) / TILE * TILE;
-        else if (std::strcmp(pArguments[n], "--only") == 0)
-            only = pArguments[n + 1];
-    }
+    const Arguments oArguments(nArguments, pArguments, "FOLDER [--size N] [--only none|deflate|zstd]");
+    const std::string& folder = oArguments.GetWords().front();
+    const unsigned int nSize = oArguments.GetNumber("size", 8192) / TILE * TILE;
     std::filesystem::create_directories(folder);
 #ifdef KRV_HAVE_VIPS
     if (VIPS_INIT(pArguments[0]) != 0)
@@ -349,11 +338,11 @@ int main(int nArguments, char** pArguments)
     Pixels oPixels = LoadPixels(MakeScene(folder, {"3x8U", CHANNELS, 8, false}, "none", TILE, nSize));
     PrintHeading("Writing " + std::to_string(nSize) + " x " + std::to_string(nSize) +
                  " x 3 in tiles of 256, against straight code over pwrite and the codecs");
-    if (only.empty() || only == "none")
+    if (oArguments.Wants("none"))
         Measure(oPixels, "none", folder, 0.95, 11);
-    if (only.empty() || only == "deflate")
+    if (oArguments.Wants("deflate"))
         Measure(oPixels, "deflate", folder, 0.97, 3);
-    if (only.empty() || only == "zstd")
+    if (oArguments.Wants("zstd"))
         Measure(oPixels, "zstd", folder, 0.97, 5);
     return 0;
 }
