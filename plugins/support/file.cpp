@@ -67,9 +67,12 @@ std::string MakeTemporaryName(const std::string& fileName, const Place& oPlace)
         throw IOException(fileName, fileName + ": is not a plain file and is not replaced", oPlace);
     if (::access(fileName.c_str(), W_OK) != 0 && errno != ENOENT && errno != ENOTDIR)
         throw IOException(fileName, fileName + ": cannot be replaced: " + SystemErrorText(errno), oPlace);
-    static std::atomic<unsigned int> nCounter = 0;
     const std::size_t nSlash = fileName.rfind('/');
     const std::size_t nBegin = nSlash == std::string::npos ? 0 : nSlash + 1;
+    const std::string folder = nBegin == 0 ? "." : fileName.substr(0, nBegin == 1 ? 1 : nBegin - 1);
+    if (::stat(folder.c_str(), &oStatus) != 0 && (errno == ENOENT || errno == ENOTDIR))
+        throw FileNotFoundException(fileName, fileName + ": there is no folder " + folder + " to create it in", oPlace);
+    static std::atomic<unsigned int> nCounter = 0;
     return fileName.substr(0, nBegin) + "." + fileName.substr(nBegin, 200) + "." + std::to_string(::getpid()) + "." +
            std::to_string(nCounter++) + ".part";
 }

@@ -82,8 +82,9 @@ private:
 };
 
 // A name for what becomes fileName when it is whole: in the same folder, so that it can be renamed, of no length that a
-// folder does not take, and of this process alone. Throws IOException when a folder, a device or the like has the name,
-// or a file that must not be written: renaming would put the file in its place.
+// folder does not take, and of this process alone. Throws FileNotFoundException when there is no such folder, and
+// IOException when a folder, a device or the like has the name, or a file that must not be written: renaming would put
+// the file in its place.
 std::string MakeTemporaryName(const std::string& fileName, const Place& oPlace = Place::Current());
 
 // The text of an error number, in the C locale.

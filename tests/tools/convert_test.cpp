@@ -303,14 +303,19 @@ TEST(Convert, FailuresLeaveNothingBehindAndTheOldFileAsItWas)
     const std::string a = oFolder.File("a.dem"), b = oFolder.File("b.dem"), out = oFolder.Write("out.tif", "old");
     krv::test::WriteDemoFile(a, 50, 40, {krv::gobs::eDT_8U});
     krv::test::WriteDemoFile(b, 40, 50, {krv::gobs::eDT_8U});
-    ExpectFailure(RunConvert({a, oFolder.GetPath() + "/./a.dem"}), 1, "is the file itself");
+    ExpectFailure(RunConvert({a, oFolder.GetPath() + "/./a.dem"}), 2, "is the file itself");
     ExpectFailure(RunConvert({a, b, out}), 1, "of one size");
     ExpectFailure(RunConvert({a, out, "--window", "20,0,31,40"}), 2, "not inside the image of 50 x 40");
     ExpectFailure(RunConvert({a, out, "--window", "1,2"}), 2, "x,y,width,height");
     ExpectFailure(RunConvert({a, out, "--channels", "2"}), 2, "no channel 2");
     ExpectFailure(RunConvert({a, out, "--type", "9U"}), 2, "9U");
     ExpectFailure(RunConvert({a, out, "--format", "NONE"}), 2, "NONE");
-    ExpectFailure(RunConvert({a, out, "--options", "COMPRESS=MAGIC"}), 1, "COMPRESS=MAGIC");
+    ExpectFailure(RunConvert({a, out, "--options", "COMPRESS=MAGIC"}), 2, "COMPRESS=MAGIC");
+    ExpectFailure(RunConvert({a, out, "--options", "PREDICTOR=3 COMPRESS=LZW"}), 2, "8U");
+    ExpectFailure(RunConvert({a, out, "--window", "0,0,99999999999,5"}), 2, "above 4294967295");
+    ExpectFailure(RunConvert({a, out, "--channels", ""}), 2, "--channels: the value is empty");
+    ExpectFailure(RunConvert({a, oFolder.File("out.png")}), 2, "extension .png");
+    ExpectFailure(RunConvert({a, oFolder.GetPath() + "/none/out.tif"}), 1, "there is no folder " + oFolder.GetPath());
     ExpectFailure(RunConvert({a, oFolder.GetPath()}), 1, "no plain file");
     // A file that ends in the middle of its pixels fails on the way.
     std::filesystem::resize_file(a, std::filesystem::file_size(a) - 900);

@@ -81,7 +81,9 @@ TEST(OverviewsVerb, RefusalsLeaveTheFileAsItIs)
         {{"overviews", file, "--resampling", "average"}, 2, "colour table"},
         {{"overviews", file, "--resampling", "best"}, 2, "best"},
         {{"overviews", file, "--levels", "2,x"}, 2, "--levels"},
-        {{"overviews", file, "--levels", "1"}, 1, "factors from 2"},
+        {{"overviews", file, "--levels", "1"}, 2, "factors from 2"},
+        {{"overviews", file, "--changed", "300,0,9,9"}, 2, "no pixel of the image"},
+        {{"overviews", file, "--levels", "2,4096"}, 2, "from 2 to 512"},
         {{"overviews", file, "--changed", "1,2"}, 2, "--changed"},
         {{"overviews", oFolder.File("none.tif")}, 1, "no such file"},
     };

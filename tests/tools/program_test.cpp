@@ -151,7 +151,7 @@ TEST(Command, ViewMakesMissingPixelsTransparent)
     EXPECT_EQ(ReadPng(target, oPixels).width, 300U);
     std::filesystem::remove(target);
     ExpectFailure(RunKrv({"view", SceneFolder() + "/pan.tif", oFolder.GetPath() + "/no/look.png"}), 1,
-                  {"no/look.png", "No such file"});
+                  {"no/look.png", "there is no folder"});
     ASSERT_EQ(mkfifo(target.c_str(), 0600), 0);
     ExpectFailure(RunKrv({"view", SceneFolder() + "/pan.tif", target}), 1, {target, "not a regular file"});
     EXPECT_TRUE(std::filesystem::is_fifo(target));
@@ -172,6 +172,8 @@ TEST(Command, WrongUsageIsTwo)
     ExpectFailure(RunKrv({"checksum", scene, "--channels", "4"}), 2, {"rgb.tif", "no channel 4", "1 to 3"});
     ExpectFailure(RunKrv({"checksum", scene, "--channels", "1;2"}), 2, {"--channels"});
     ExpectFailure(RunKrv({"checksum", scene, "--level", "2"}), 2, {"rgb.tif", "no level 2"});
+    ExpectFailure(RunKrv({"walk", scene, "--margins", "151,0"}), 2, {"--margins", "half"});
+    ExpectFailure(RunKrv({"walk", scene, "--tile", "0,8"}), 2, {"--tile"});
 }
 
 TEST(Command, ErrorsNameFileCauseAndRemedy)

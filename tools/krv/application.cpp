@@ -18,15 +18,17 @@ namespace krv::tool
 namespace
 {
 
-constexpr char FOOTER[] = "Examples:\n"
-                          "  krv info scene.tif                     everything known of a file\n"
-                          "  krv stats scene.tif --json             statistics per channel, for other programs\n"
-                          "  krv view scene.tif look.png --size 800 a quick look\n"
-                          "  krv convert scene.tif copy.tif --options COMPRESS=ZSTD\n"
-                          "  krv overviews scene.tif                overview levels, powers of two\n"
-                          "  krv doctor scene.tif                   why a file does or does not open\n"
-                          "`krv VERB --help` explains a verb. Exit code: 0 done, 1 failed, 2 wrong usage.\n"
-                          "Formats are found below the folder that KRVHOME names, else beside the library.";
+constexpr char FOOTER[] =
+    "Examples:\n"
+    "  krv info scene.tif                     everything known of a file\n"
+    "  krv stats scene.tif --json             statistics per channel, for other programs\n"
+    "  krv view scene.tif look.png --size 800 a quick look\n"
+    "  krv convert scene.tif copy.tif --options COMPRESS=ZSTD\n"
+    "  krv overviews scene.tif                overview levels, powers of two\n"
+    "  krv doctor scene.tif                   why a file does or does not open\n"
+    "`krv VERB --help` explains a verb. Exit code: 0 done; 2 the command line is wrong, by itself or\n"
+    "for this file; 1 it failed: a file, the disk, memory, an interrupt.\n"
+    "Formats are found below the folder that KRVHOME names, else beside the library.";
 
 // Warnings that the library gave, each once. They are told at the end, except one that is the error itself.
 std::vector<std::string>& Warnings()
@@ -48,6 +50,20 @@ void TellWarnings(const std::string& error)
     {
         if (OneLine(warning) != error)
             std::fprintf(stderr, "krv: warning: %s\n", OneLine(warning).c_str());
+    }
+}
+
+// An empty value is a slip, such as a variable of a script that was never set. No options at all are a choice.
+void RefuseEmptyValues(CLI::App& oApp)
+{
+    for (CLI::App* const poVerb : oApp.get_subcommands({}))
+    {
+        for (CLI::Option* const poOption : poVerb->get_options())
+        {
+            if (poOption->get_items_expected_max() > 0 && !poOption->check_lname("options"))
+                poOption->check([](const std::string& text)
+                                { return std::string(text.empty() ? "the value is empty; give one" : ""); });
+        }
     }
 }
 
@@ -95,6 +111,7 @@ int RunApplication(int nArguments, char** pArguments)
     AddOverviewsVerb(oApp, oSelection);
     AddMaskVerb(oApp, oSelection);
     AddDoctorVerb(oApp, oSelection);
+    RefuseEmptyValues(oApp);
     oApp.footer(FOOTER); // after the verbs, which would take it over
     try
     {

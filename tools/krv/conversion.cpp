@@ -48,7 +48,7 @@ void CheckTarget(const CopyRequest& oRequest, const std::string& target)
     for (const std::string& source : oRequest.sources)
     {
         if (std::filesystem::equivalent(source, target, oNone))
-            throw krv::DataException(target + " is the file itself; name another for the copy");
+            throw UsageError(target + " is the file itself; name another for the copy");
     }
     if (std::filesystem::exists(target, oNone) && !std::filesystem::is_regular_file(target, oNone))
         throw krv::DataException(target + " is there and no plain file; name another for the copy");
@@ -60,12 +60,13 @@ bool EqualNames(const std::string& first, const std::string& second)
                       [](unsigned char a, unsigned char b) { return std::tolower(a) == std::tolower(b); });
 }
 
-// By the extension of the file's name when the user names no format.
+// By the extension of the file's name when the user names no format. A name whose extension belongs to none is refused:
+// a file of another kind under it would deceive every other program.
 std::string ChooseFormat(const TargetForm& oForm)
 {
     const DatasetManager& oManager = *DatasetManager::GetInstance();
     const std::string extension = std::filesystem::path(oForm.name).extension().string();
-    std::string format = "TIF";
+    std::string format = extension.size() < 2 ? "TIF" : "";
     std::string all;
     bool bKnown = oForm.format.empty();
     for (const IFileFormat* const poFormat : oManager.GetFormatList())
@@ -80,14 +81,36 @@ std::string ChooseFormat(const TargetForm& oForm)
     }
     if (!bKnown)
         throw UsageError(fmt::format("--format: there is no format {}; there are {}", oForm.format, all));
+    if (oForm.format.empty() && format.empty())
+        throw UsageError(fmt::format("{}: no format has the extension {}; name the file otherwise, or choose with "
+                                     "--format among {}{}",
+                                     oForm.name, extension, all,
+                                     EqualNames(extension, ".png") ? " (`krv view` makes pictures)" : ""));
     if (!oForm.format.empty())
     {
         format = oForm.format;
         std::transform(format.begin(), format.end(), format.begin(), [](unsigned char c) { return std::toupper(c); });
     }
     if (!oManager.GetCapabilities(format).IsSupported(CAPABILITY_CREATE))
-        throw krv::DataException(fmt::format("{}: the format {} cannot create files", oForm.name, format));
+        throw UsageError(
+            fmt::format("{}: the format {} cannot create files; choose another with --format", oForm.name, format));
     return format;
+}
+
+// What a format holds against the options that it was given is a matter of the command line.
+template <typename Action>
+auto WithOptions(const TargetForm& oForm, Action oAction)
+{
+    try
+    {
+        return oAction();
+    }
+    catch (const krv::DataException& oError)
+    {
+        if (oForm.options.empty())
+            throw;
+        throw UsageError("--options: " + oError.GetMessage());
+    }
 }
 
 // The new file while it is being made. What is not finished goes with it.
@@ -95,22 +118,24 @@ class Target
 {
 public:
     Target(const CopyPlan& oPlan, const TargetForm& oForm)
-        : moName(oForm.name),
-          mpoDataset(DatasetManager::GetInstance()->NewDataset(moName, ChooseFormat(oForm), oForm.options)),
-          mpoRaster(dynamic_cast<IRasterDataset*>(mpoDataset.get()))
+        : moName(oForm.name), mpoDataset(MakeDataset(oForm)), mpoRaster(dynamic_cast<IRasterDataset*>(mpoDataset.get()))
     {
         if (mpoRaster == nullptr)
             throw krv::DataException(moName + ": the format does not hold images");
         const auto oTypes = oPlan.GetTypes();
-        try
+        const auto Create = [&]
         {
             mpoRaster->Create(oPlan.GetWindow().width, oPlan.GetWindow().height, oTypes);
+        };
+        const bool bMixed =
+            std::any_of(oTypes.begin(), oTypes.end(), [&](const auto& oType) { return oType != oTypes.front(); });
+        try
+        {
+            bMixed ? Create() : WithOptions(oForm, Create);
         }
         catch (const krv::DataException& oError)
         {
-            if (std::all_of(oTypes.begin(), oTypes.end(), [&](const auto& oType) { return oType == oTypes.front(); }))
-                throw;
-            throw krv::DataException(oError.GetMessage() + " (--type gives all channels one type)");
+            throw krv::DataException(oError.GetMessage() + (bMixed ? " (--type gives all channels one type)" : ""));
         }
     }
 
@@ -138,6 +163,13 @@ public:
     }
 
 private:
+    static IDataset* MakeDataset(const TargetForm& oForm)
+    {
+        const std::string format = ChooseFormat(oForm);
+        return WithOptions(oForm, [&]
+                           { return DatasetManager::GetInstance()->NewDataset(oForm.name, format, oForm.options); });
+    }
+
     std::string moName;
     std::unique_ptr<IDataset> mpoDataset;
     IRasterDataset* mpoRaster;

@@ -32,6 +32,8 @@ public:
         if (stat(name.c_str(), &oStatus) == 0 && !S_ISREG(oStatus.st_mode))
             throw krv::IOException(name, "it cannot be written: it is not a regular file");
         mpFile = std::fopen(moPart.c_str(), "wb");
+        if (mpFile == nullptr && (errno == ENOENT || errno == ENOTDIR))
+            throw krv::FileNotFoundException(name, "there is no folder to write it in");
         if (mpFile == nullptr)
             Fail("it cannot be written");
     }

@@ -7,6 +7,7 @@
 #include <algorithm>
 #include <cctype>
 #include <charconv>
+#include <set>
 #include <sstream>
 #include <utility>
 #include <vector>
@@ -123,8 +124,10 @@ bool ApplyMeaning(const Setting& oSetting, CreateOptions& oOptions)
     return true;
 }
 
-void CheckTogether(const CreateOptions& oOptions, const Place& oPlace)
+void CheckTogether(const CreateOptions& oOptions, const std::set<std::string>& oKeys, const Place& oPlace)
 {
+    if (!oOptions.mbTiled && oKeys.contains("BLOCKXSIZE"))
+        throw DataException("The option BLOCKXSIZE is the width of tiles; it does not go with TILED=NO", oPlace);
     if (oOptions.mbCloud && !oOptions.mbTiled)
         throw DataException("The option LAYOUT=COG takes tiles; it does not go with TILED=NO", oPlace);
     if (oOptions.mbTiled && (oOptions.mnBlockWidth % 16 != 0 || oOptions.mnBlockHeight % 16 != 0))
@@ -156,6 +159,7 @@ CreateOptions CreateOptions::Parse(const std::string& options, const Place& oPla
 {
     CreateOptions oOptions;
     std::istringstream oWords(options);
+    std::set<std::string> oKeys;
     for (std::string word; oWords >> word;)
     {
         const std::size_t nSign = word.find('=');
@@ -164,8 +168,10 @@ CreateOptions CreateOptions::Parse(const std::string& options, const Place& oPla
         const Setting oSetting{Upper(word.substr(0, nSign)), Upper(word.substr(nSign + 1)), oPlace};
         if (!ApplyLayout(oSetting, oOptions) && !ApplyCoding(oSetting, oOptions) && !ApplyMeaning(oSetting, oOptions))
             throw DataException("The option " + oSetting.moKey + " is not known", oPlace);
+        if (!oKeys.insert(oSetting.moKey).second)
+            throw DataException("The option " + oSetting.moKey + " is given twice", oPlace);
     }
-    CheckTogether(oOptions, oPlace);
+    CheckTogether(oOptions, oKeys, oPlace);
     return oOptions;
 }
 

@@ -150,6 +150,8 @@ TEST(TifCreate, OptionsAndTypesThatDoNotGoTogetherAreNamed)
     EXPECT_THAT(Message("COMPRESS=LZ77", oBytes), testing::HasSubstr("COMPRESS=LZ77"));
     EXPECT_THAT(Message("TILED", oBytes), testing::HasSubstr("KEY=VALUE"));
     EXPECT_THAT(Message("BLOCKXSIZE=100", oBytes), testing::HasSubstr("multiples of 16"));
+    EXPECT_THAT(Message("TILED=NO BLOCKXSIZE=64", oBytes), testing::HasSubstr("BLOCKXSIZE"));
+    EXPECT_THAT(Message("COMPRESS=LZW compress=ZSTD", oBytes), testing::HasSubstr("COMPRESS is given twice"));
     EXPECT_THAT(Message("LEVEL=3", oBytes), testing::HasSubstr("LEVEL"));
     EXPECT_THAT(Message("COMPRESS=ZSTD LEVEL=23", oBytes), testing::HasSubstr("at most 22"));
     EXPECT_THAT(Message("COMPRESS=ZSTD PREDICTOR=3", oBytes), testing::HasSubstr("8U"));

@@ -99,43 +99,194 @@ TEST(TifUpdate, WhatIsNotSynchronisedIsNotInTheFile)
     }
 }
 
-// A file whose pixels are all one number is rewritten with the next one over and over; a kill leaves one of them whole.
+// What a writer does besides filling all pixels with the number of the state, and the same number as a reader finds it;
+// nothing when there is none yet.
+struct WayOfWriting
+{
+    const char* mpName;
+    void (*mpWrite)(krv::plugins::tif::TifDataset&, unsigned char nState);
+    Bytes (*mpRead)(krv::plugins::tif::TifDataset&);
+};
+
+void WriteState(krv::plugins::tif::TifDataset& oDataset, const WayOfWriting& oWay, unsigned char nState)
+{
+    oWay.mpWrite(oDataset, nState);
+    WriteAll(oDataset, Bytes(std::size_t{300} * 200 * oDataset.GetChanCount(), nState));
+}
+
+constexpr WayOfWriting WAYS[] = {
+    {"pixels", [](auto&, unsigned char) {},
+     [](auto&)
+     {
+         return Bytes();
+     }},
+    {"metadata",
+     [](auto& oDataset, unsigned char nState)
+     {
+         AuxiliaryData oData = oDataset.ReadAuxiliaryData();
+         oData.SetFileMetadataValue("State", std::string(nState * 99U, 'x'));
+         oDataset.WriteAuxiliaryData(oData);
+     },
+     [](auto& oDataset)
+     {
+         const std::size_t nLength = oDataset.ReadAuxiliaryData().GetFileMetadataValue("State").size();
+         return Bytes(1, static_cast<unsigned char>(nLength / 99));
+     }},
+    {"levels",
+     [](auto& oDataset, unsigned char nState)
+     {
+         const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(oDataset.GetOverviewManager());
+         if (!poLevels->GetLevels().empty())
+             poLevels->DeleteLevel(2);
+         poLevels->CreateLevel(2);
+         const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(2, {1}));
+         WriteAll(*poIO, 1, Bytes(150 * 100, nState));
+     },
+     [](auto& oDataset)
+     {
+         const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(oDataset.GetOverviewManager());
+         if (poLevels->GetLevels().empty())
+             return Bytes();
+         const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(2, {1}));
+         return ReadAll(*poIO, 1);
+     }},
+    {"bitmaps",
+     [](auto& oDataset, unsigned char nState)
+     {
+         for (const unsigned int nBitmap : oDataset.GetBitmapList())
+             oDataset.DeleteBitmap(nBitmap);
+         const unsigned int nBitmap = oDataset.CreateBitmap();
+         oDataset.SetBitmapDescription(nBitmap, std::to_string(nState));
+         const std::unique_ptr<krv::datasources::IRasterIO> poIO(oDataset.GetBitmapIO({nBitmap}));
+         WriteAll(*poIO, 1, Bytes(300 * 200, nState & 1));
+     },
+     [](auto& oDataset)
+     {
+         if (oDataset.GetBitmapList().empty())
+             return Bytes();
+         const unsigned int nBitmap = oDataset.GetBitmapList().front();
+         const auto nState = static_cast<unsigned char>(std::stoi(oDataset.GetBitmapDescription(nBitmap)));
+         const std::unique_ptr<krv::datasources::IRasterIO> poIO(oDataset.GetBitmapIO({nBitmap}));
+         Bytes oBits = ReadAll(*poIO, 1);
+         for (unsigned char& nBit : oBits)
+             nBit = nBit == (nState & 1) ? nState : static_cast<unsigned char>(nState + 1);
+         return oBits;
+     }},
+    {"channels",
+     [](auto& oDataset, unsigned char)
+     {
+         if (oDataset.GetChanCount() == 1)
+             oDataset.AddNewChannel(krv::gobs::RasterInfo(300, 200, 1, krv::gobs::eDT_8U));
+         else
+             oDataset.DeleteChannel(1);
+     },
+     [](auto&)
+     {
+         return Bytes();
+     }}};
+
+// Runs a writer that never ends and kills it at a random moment.
+template <typename Writer>
+void Kill(std::mt19937& oRandom, Writer oWriter)
+{
+    const pid_t nChild = ::fork();
+    if (nChild == 0)
+        oWriter();
+    std::this_thread::sleep_for(std::chrono::microseconds(oRandom() % 60000));
+    ::kill(nChild, SIGKILL);
+    int nStatus = 0;
+    ::waitpid(nChild, &nStatus, 0);
+    ASSERT_TRUE(WIFSIGNALED(nStatus) && WTERMSIG(nStatus) == SIGKILL) << "the writer failed before it was killed";
+}
+
+// How often each way of writing is killed.
+int KillRuns()
+{
+    const char* const pRuns = std::getenv("KRV_KILL_RUNS");
+    return pRuns != nullptr ? std::atoi(pRuns) : 4;
+}
+
+// A file that shows one number everywhere is rewritten with the next one over and over; a kill leaves one of them
+// whole.
 TEST(TifUpdate, AKilledWriterLeavesTheLastSynchronisedState)
 {
-    const char* pRuns = std::getenv("KRV_KILL_RUNS");
-    const int nRuns = pRuns != nullptr ? std::atoi(pRuns) : 8;
     std::mt19937 oRandom(20);
+    for (const WayOfWriting& oWay : WAYS)
+    {
+        int nChanged = 0;
+        for (int nRun = 0; nRun < KillRuns(); ++nRun)
+        {
+            const TempFolder oFolder;
+            const std::string fileName = oFolder.File("k.tif");
+            const char* const pKind = KINDS[nRun / 2 % 4];
+            SCOPED_TRACE(std::string(oWay.mpName) + ", run " + std::to_string(nRun) + " " + pKind);
+            const bool bNew = nRun % 2 == 1;
+            if (!bNew)
+                CreateTif(fileName, pKind, 300, 200, 1, krv::gobs::eDT_8U)->Close();
+            Kill(oRandom,
+                 [&]
+                 {
+                     const TifPointer poDataset =
+                         bNew ? CreateTif(fileName, pKind, 300, 200, 1, krv::gobs::eDT_8U) : OpenTif(fileName, eUpdate);
+                     for (unsigned char nState = 1;; ++nState)
+                     {
+                         WriteState(*poDataset, oWay, nState);
+                         poDataset->Synchronize();
+                     }
+                 });
+            if (bNew && !std::filesystem::exists(fileName))
+                continue;
+            ASSERT_EQ(Judge(fileName).moComplaints, "");
+            const TifPointer poDataset = OpenTif(fileName, eUpdate);
+            const Bytes oPixels = ReadAll(*poDataset), oMore = oWay.mpRead(*poDataset);
+            ASSERT_EQ(std::count(oPixels.begin(), oPixels.end(), oPixels[0]), std::ssize(oPixels));
+            ASSERT_EQ(std::count(oMore.begin(), oMore.end(), oPixels[0]), std::ssize(oMore));
+            nChanged += oPixels[0] != 0 ? 1 : 0;
+        }
+        EXPECT_GT(nChanged, 0) << oWay.mpName << ": no writer lived long enough";
+    }
+}
+
+// One that lays its file out anew at the end leaves the one before, and what is left behind is never taken for a file.
+TEST(TifUpdate, AKilledWriterOfAnOrderedFileLeavesTheOneBefore)
+{
+    std::mt19937 oRandom(21);
     int nChanged = 0;
-    for (int nRun = 0; nRun < nRuns; ++nRun)
+    for (int nRun = 0; nRun < KillRuns(); ++nRun)
     {
         const TempFolder oFolder;
         const std::string fileName = oFolder.File("k.tif");
-        const char* pKind = KINDS[nRun % 4];
-        SCOPED_TRACE("run " + std::to_string(nRun) + " " + pKind);
-        const bool bNew = nRun % 2 == 1;
-        if (!bNew)
-            CreateTif(fileName, pKind, 300, 200, 1, krv::gobs::eDT_8U)->Close();
-        const pid_t nChild = ::fork();
-        if (nChild == 0)
+        Kill(oRandom,
+             [&]
+             {
+                 for (unsigned char nState = 1;; ++nState)
+                 {
+                     const TifPointer poDataset =
+                         CreateTif(fileName, "LAYOUT=COG BLOCKXSIZE=32 BLOCKYSIZE=32", 300, 200, 1, krv::gobs::eDT_8U);
+                     for (const std::size_t nWay : {1U, 2U, 3U})
+                         WAYS[nWay].mpWrite(*poDataset, nState);
+                     WriteState(*poDataset, WAYS[0], nState);
+                     poDataset->Close();
+                 }
+             });
+        for (const std::string& name : ListFolder(oFolder.GetPath()))
         {
-            TifPointer poDataset =
-                bNew ? CreateTif(fileName, pKind, 300, 200, 1, krv::gobs::eDT_8U) : OpenTif(fileName, eUpdate);
-            for (unsigned int nValue = 1;; ++nValue)
+            if (name != "k.tif")
             {
-                WriteAll(*poDataset, Bytes(300 * 200, static_cast<unsigned char>(nValue)));
-                poDataset->Synchronize();
+                EXPECT_TRUE(name.starts_with(".k.tif.") && name.ends_with(".part")) << name;
+                continue;
             }
+            ASSERT_EQ(Judge(fileName).moComplaints, "");
+            const TifPointer poDataset = OpenTif(fileName);
+            Bytes oValues = ReadAll(*poDataset);
+            for (const std::size_t nWay : {1U, 2U, 3U})
+            {
+                const Bytes oMore = WAYS[nWay].mpRead(*poDataset);
+                oValues.insert(oValues.end(), oMore.begin(), oMore.end());
+            }
+            ASSERT_EQ(std::count(oValues.begin(), oValues.end(), oValues[0]), std::ssize(oValues));
+            ++nChanged;
         }
-        std::this_thread::sleep_for(std::chrono::microseconds(oRandom() % 60000));
-        ::kill(nChild, SIGKILL);
-        ::waitpid(nChild, nullptr, 0);
-        if (bNew && !std::filesystem::exists(fileName))
-            continue;
-        const Judgement oJudgement = Judge(fileName);
-        ASSERT_EQ(oJudgement.moComplaints, "");
-        ASSERT_EQ(std::count(oJudgement.moPixels.begin(), oJudgement.moPixels.end(), oJudgement.moPixels[0]),
-                  300 * 200);
-        nChanged += oJudgement.moPixels[0] != 0 ? 1 : 0;
     }
     EXPECT_GT(nChanged, 0) << "no writer lived long enough";
 }

@@ -8,6 +8,7 @@
 #include <CLI/CLI.hpp>
 #include <fmt/format.h>
 
+#include <limits>
 #include <memory>
 
 namespace krv::tool
@@ -66,7 +67,7 @@ void AddChecksumVerb(CLI::App& oApp, Selection& oSelection)
     poVerb->add_option("FILE", oSelection.file, "The file")->required();
     poVerb->add_option("--channels", poOptions->channels, "Only these, such as 1,3");
     poVerb->add_option("--level", poOptions->level, "Of an overview level, such as 2 (`krv info` lists them)")
-        ->check(CLI::PositiveNumber);
+        ->check(CLI::Range(1U, std::numeric_limits<unsigned int>::max()));
     poVerb->add_flag("--json", poOptions->json, "As JSON");
     poVerb->callback(
         [&oSelection, poOptions]

@@ -78,7 +78,7 @@ void AddConvertVerb(CLI::App& oApp, Selection& oSelection)
     poVerb->add_option("--type", poOptions->type,
                        "Values of this type, such as 16S, or of the smallest that holds all: promoted");
     poVerb->add_option("--format", poOptions->form.format,
-                       "The new file's format (`krv formats`); else by its extension, else TIF");
+                       "The new file's format (`krv formats`); else by its extension, TIF when it has none");
     poVerb->add_option("--options", poOptions->form.options,
                        "\"KEY=VALUE ...\" of the format, such as \"COMPRESS=ZSTD BLOCKXSIZE=512\"; \"LAYOUT=COG\" of "
                        "TIF also builds levels");

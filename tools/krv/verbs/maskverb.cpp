@@ -1,4 +1,3 @@
-#include "toolkit/exceptions/exceptions.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/masking.h"
@@ -72,7 +71,7 @@ int RunMask(const std::string& file, Options& oOptions)
     MaskRequest& oRequest = oOptions.request;
     std::error_code oNone;
     if (!oRequest.picture.empty() && std::filesystem::equivalent(file, oRequest.picture, oNone))
-        throw krv::DataException(oRequest.picture + " is the file itself; name another for the picture");
+        throw UsageError(oRequest.picture + " is the file itself; name another for the picture");
     const MaskResult oResult = MakeMask(file, oRequest);
     const char* const pSource = oRequest.noData ? "no-data" : oRequest.bitmaps.empty() ? "polygons" : "bitmaps";
     if (oOptions.json)

@@ -53,6 +53,16 @@ std::string ChooseMethod(const std::string& file, const std::string& wanted, boo
     return wanted;
 }
 
+std::vector<unsigned int> ParseLevels(const std::string& text)
+{
+    auto oLevels = ParseNumbers(text, "--levels");
+    std::sort(oLevels.begin(), oLevels.end());
+    oLevels.erase(std::unique(oLevels.begin(), oLevels.end()), oLevels.end());
+    if (!oLevels.empty() && oLevels.front() < 2)
+        throw UsageError("--levels: \"" + text + "\" holds a number below 2; levels are factors from 2, such as 2,4,8");
+    return oLevels;
+}
+
 void SetChanged(const std::string& text, OverviewOptions& oOptions)
 {
     const auto oNumbers = ParseNumbers(text, "--changed");
@@ -61,6 +71,16 @@ void SetChanged(const std::string& text, OverviewOptions& oOptions)
     if (oNumbers.size() != 4)
         throw UsageError("--changed: \"" + text + "\" is not x,y,width,height");
     oOptions.moChanged = OverviewOptions::Rectangle{oNumbers[0], oNumbers[1], oNumbers[2], oNumbers[3]};
+}
+
+void CheckChanged(const std::string& file, const OverviewOptions& oOptions, unsigned int nWidth, unsigned int nHeight)
+{
+    if (!oOptions.moChanged)
+        return;
+    const OverviewOptions::Rectangle& oPart = *oOptions.moChanged;
+    if (oPart.mnWidth == 0 || oPart.mnHeight == 0 || oPart.mnX >= nWidth || oPart.mnY >= nHeight)
+        throw UsageError(fmt::format("{}: --changed: {} x {} at {}, {} holds no pixel of the image of {} x {}", file,
+                                     oPart.mnWidth, oPart.mnHeight, oPart.mnX, oPart.mnY, nWidth, nHeight));
 }
 
 std::unique_ptr<IDataset> OpenForUpdate(const std::string& file)
@@ -83,12 +103,19 @@ void Build(BasicWriter& oWriter, const std::vector<unsigned int>& oLevels, const
         poProgress->Advance(nDone * nPixelBytes - poProgress->GetDone());
         return true;
     };
-    krv::datasources::BuildOverviews(oWriter, oLevels, method, oOptions);
+    try
+    {
+        krv::datasources::BuildOverviews(oWriter, oLevels, method, oOptions);
+    }
+    catch (const krv::ParameterException& oError)
+    {
+        throw UsageError("--levels: " + oError.GetMessage());
+    }
 }
 
 int RunOverviews(const std::string& file, Options& oOptions)
 {
-    auto oLevels = ParseNumbers(oOptions.levels, "--levels");
+    auto oLevels = ParseLevels(oOptions.levels);
     SetChanged(oOptions.changed, oOptions.building);
     std::vector<ChannelGroup> oGroups;
     std::string method;
@@ -98,6 +125,7 @@ int RunOverviews(const std::string& file, Options& oOptions)
         nWidth = oFile.GetRaster().GetWidth();
         nHeight = oFile.GetRaster().GetHeight();
         oGroups = oFile.GroupByType(oFile.CheckChannels({}));
+        CheckChanged(file, oOptions.building, nWidth, nHeight);
         method = ChooseMethod(file, oOptions.resampling, IsIndexed(oFile.GetDataset()));
     }
     if (oLevels.empty())
@@ -114,8 +142,6 @@ int RunOverviews(const std::string& file, Options& oOptions)
         Build(oWriter, oLevels, method, oOptions.building);
     }
     poDataset->Synchronize();
-    std::sort(oLevels.begin(), oLevels.end());
-    oLevels.erase(std::unique(oLevels.begin(), oLevels.end()), oLevels.end());
     for (const unsigned int nLevel : oLevels)
         Print(fmt::format("level {}: {} x {}\n", nLevel, (nWidth - 1) / nLevel + 1, (nHeight - 1) / nLevel + 1));
     return 0;

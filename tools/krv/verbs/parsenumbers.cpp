@@ -2,6 +2,8 @@
 #include "tools/krv/verbs/verbs.h"
 
 #include <charconv>
+#include <limits>
+#include <string>
 
 namespace krv::tool
 {
@@ -16,6 +18,9 @@ std::vector<unsigned int> ParseNumbers(const std::string& text, const std::strin
         unsigned int nNumber = 0;
         const auto [pNext, eError] = std::from_chars(pAt, pEnd, nNumber);
         const bool bLast = pNext == pEnd;
+        if (eError == std::errc::result_out_of_range)
+            throw UsageError(option + ": \"" + text + "\" holds a number above " +
+                             std::to_string(std::numeric_limits<unsigned int>::max()) + "; give smaller ones");
         if (eError != std::errc() || (!bLast && (*pNext != ',' || pNext + 1 == pEnd)))
             throw UsageError(option + ": \"" + text + "\" is no list of numbers such as 1,2,3");
         oNumbers.push_back(nNumber);

@@ -1,4 +1,4 @@
-#include "toolkit/exceptions/exceptions.h"
+#include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/quicklook.h"
 #include "tools/krv/sourcefile.h"
@@ -32,7 +32,7 @@ int RunView(const std::string& file, Options& oOptions)
     oOptions.look.average = !oOptions.nearest;
     std::error_code oNone;
     if (std::filesystem::equivalent(file, oOptions.target, oNone))
-        throw krv::DataException(oOptions.target + " is the file itself; name another for the quick look");
+        throw UsageError(oOptions.target + " is the file itself; name another for the quick look");
     const SourceFile oFile(file);
     const QuickLook oLook = MakeQuickLook(oFile, oOptions.look);
     WritePng(oLook.picture, oOptions.target);

@@ -1,6 +1,7 @@
 #include "datasources/reader/irasterreader.h"
 #include "datasources/reader/rasterrange.h"
 #include "gobs/raster/raster.h"
+#include "toolkit/exceptions/exceptions.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/progress.h"
@@ -49,6 +50,18 @@ void ParsePair(const std::string& text, const std::string& option, unsigned int&
     nY = oNumbers.back();
 }
 
+void SetMargins(krv::datasources::IRasterReader& oReader, unsigned int nX, unsigned int nY, eMarginBehaviour eBehaviour)
+{
+    try
+    {
+        oReader.SetMargins(nX, nY, eBehaviour);
+    }
+    catch (const krv::DataException& oError)
+    {
+        throw UsageError("--margins: " + oError.GetMessage());
+    }
+}
+
 void Walk(krv::datasources::IRasterReader& oReader, Progress& oProgress, Walked& oWalked)
 {
     for (const std::unique_ptr<krv::gobs::Raster> poTile : krv::datasources::RasterRange(oReader))
@@ -76,6 +89,8 @@ int RunWalk(const std::string& file, const Options& oOptions)
     unsigned int nXMargin = 0, nYMargin = 0, nTileWidth = 0, nTileHeight = 0;
     ParsePair(oOptions.margins, "--margins", nXMargin, nYMargin);
     ParsePair(oOptions.tile, "--tile", nTileWidth, nTileHeight);
+    if (!oOptions.tile.empty() && (nTileWidth == 0 || nTileHeight == 0))
+        throw UsageError("--tile: \"" + oOptions.tile + "\" holds a 0; tiles have pixels");
     const auto oWanted = ParseNumbers(oOptions.channels, "--channels");
     const SourceFile oFile(file);
     Walked oWalked;
@@ -87,7 +102,7 @@ int RunWalk(const std::string& file, const Options& oOptions)
             oReader.Get().SetTileSize(nTileWidth, nTileHeight);
         nTileWidth = oReader.Get().GetTileWidth();
         nTileHeight = oReader.Get().GetTileHeight();
-        oReader.Get().SetMargins(nXMargin, nYMargin, oOptions.behaviour);
+        SetMargins(oReader.Get(), nXMargin, nYMargin, oOptions.behaviour);
         Progress oProgress("walk", ExpectedBytes(oReader.Get()));
         Walk(oReader.Get(), oProgress, oWalked);
     }
