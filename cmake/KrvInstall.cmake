@@ -33,3 +33,4 @@ install(FILES ${CMAKE_BINARY_DIR}/package/krvdatasources.pc DESTINATION lib/pkgc
 # For authors of format plug-ins: the worked example; tools/conformance installs the conformance checks.
 install(FILES ${CMAKE_SOURCE_DIR}/examples/formatplugin/CMakeLists.txt DESTINATION share/krv/formatplugin)
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/plugins/demo DESTINATION share/krv/formatplugin/plugins)
+install(DIRECTORY ${CMAKE_SOURCE_DIR}/docs DESTINATION share/krv)

@@ -25,7 +25,7 @@ public:
     virtual IRasterIO* GetOverviewIO(unsigned int nLevel, const std::vector<unsigned int>& oChannels) = 0;
     // Lays out a level for all channels, not valid yet.
     virtual void CreateLevel(unsigned int nLevel) = 0;
-    // Whether a channel has the level and its pixels are up to date.
+    // Whether a channel has the level and its pixels are up to date; false, not an exception, where there is none.
     virtual bool IsValid(unsigned int nChannel, unsigned int nLevel) const = 0;
     virtual void DeleteLevel(unsigned int nLevel) = 0;
     // The method by which levels were or will be made; empty when unknown.

@@ -276,7 +276,7 @@ TEST_F(MaskCommand, FailuresSayWhyOnOneLineAndChangeNothing)
         {{demo, "--polygon", square}, 1, "not georeferenced"},
         {{demo, "--polygon", square, "--coordinates", "pixel", "--write", "new"}, 1, "plain.demo"},
         {{demo, "--no-data"}, 1, "no no-data value"},
-        {{moFile, "--no-data", "--png", moFile}, 1, "the file itself"},
+        {{moFile, "--no-data", "--png", moFile}, 2, "the file itself"},
         {{moFile, "--no-data", "--write", "new", "--png", picture}, 1, "mask.png"}};
     for (const Case& oCase : oCases)
     {
