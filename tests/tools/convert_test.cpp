@@ -62,8 +62,8 @@ std::vector<Facts> ChooseFiles()
     return oChosen;
 }
 
-// What a copy keeps: all but the file's name, its blocks, its levels, and how many bits values are stored in. The same
-// reference system may be said in other words.
+// What a copy keeps: all but the file's name, its blocks and its levels. The same reference system may be said in other
+// words.
 json Kept(const std::string& file)
 {
     const auto oRun = RunKrv({"info", file, "--json"});
@@ -71,10 +71,6 @@ json Kept(const std::string& file)
     json oInfo = oRun.Json();
     for (const char* pName : {"file", "blockWidth", "blockHeight", "overviews"})
         oInfo.erase(pName);
-    for (json& oChannel : oInfo["channels"])
-        oChannel.erase("storedType");
-    for (json& oTable : oInfo["colourTables"])
-        oTable.erase("entries");
     if (!oInfo["crs"].is_null())
         oInfo["crs"].erase("wkt");
     json& oTags = oInfo["channels"];

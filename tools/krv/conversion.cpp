@@ -113,12 +113,35 @@ auto WithOptions(const TargetForm& oForm, Action oAction)
     }
 }
 
+// In any letter case; beginning: of a word such as KEY=VALUE.
+bool HasOption(const std::string& options, const std::string& beginning)
+{
+    std::istringstream oWords(options);
+    for (std::string word; oWords >> word;)
+    {
+        if (EqualNames(word.substr(0, beginning.size()), beginning))
+            return true;
+    }
+    return false;
+}
+
+// Samples of one bit stay so where the format can do it and the user wants nothing else. JPEG has none.
+std::string CompleteOptions(const CopyPlan& oPlan, const std::string& format, const std::string& options)
+{
+    const unsigned int nBits = oPlan.GetNarrowBits();
+    if (nBits == 0 || HasOption(options, "NBITS=") || HasOption(options, "COMPRESS=JPEG") ||
+        !DatasetManager::GetInstance()->GetCapabilities(format).IsSupported(CAPABILITY_NARROW_SAMPLES))
+        return options;
+    return fmt::format("{} NBITS={}", options, nBits);
+}
+
 // The new file while it is being made. What is not finished goes with it.
 class Target
 {
 public:
     Target(const CopyPlan& oPlan, const TargetForm& oForm)
-        : moName(oForm.name), mpoDataset(MakeDataset(oForm)), mpoRaster(dynamic_cast<IRasterDataset*>(mpoDataset.get()))
+        : moName(oForm.name), mpoDataset(MakeDataset(oPlan, oForm)),
+          mpoRaster(dynamic_cast<IRasterDataset*>(mpoDataset.get()))
     {
         if (mpoRaster == nullptr)
             throw krv::DataException(moName + ": the format does not hold images");
@@ -163,11 +186,12 @@ public:
     }
 
 private:
-    static IDataset* MakeDataset(const TargetForm& oForm)
+    static IDataset* MakeDataset(const CopyPlan& oPlan, const TargetForm& oForm)
     {
         const std::string format = ChooseFormat(oForm);
-        return WithOptions(oForm, [&]
-                           { return DatasetManager::GetInstance()->NewDataset(oForm.name, format, oForm.options); });
+        const std::string options = CompleteOptions(oPlan, format, oForm.options);
+        return WithOptions(oForm,
+                           [&] { return DatasetManager::GetInstance()->NewDataset(oForm.name, format, options); });
     }
 
     std::string moName;
@@ -327,18 +351,6 @@ void CopyBitmaps(const CopyPlan& oPlan, const Target& oTarget)
     }
 }
 
-// The one option that means the same to every format: a file laid out for reading over a network has its levels.
-bool WantsLevels(const std::string& options)
-{
-    std::istringstream oWords(options);
-    for (std::string word; oWords >> word;)
-    {
-        if (EqualNames(word, "LAYOUT=COG"))
-            return true;
-    }
-    return false;
-}
-
 // Mixing the indices of a colour table gives colours that mean nothing.
 void BuildLevels(const Target& oTarget)
 {
@@ -375,7 +387,8 @@ void Convert(const CopyRequest& oRequest, const TargetForm& oForm)
     oTarget.Try("the metadata", [&] { oTarget.Get().WriteAuxiliaryData(oRecord); });
     CopyChannels(oPlan, oTarget);
     CopyBitmaps(oPlan, oTarget);
-    if (WantsLevels(oForm.options))
+    // Means the same to every format: a file laid out for reading over a network has its levels.
+    if (HasOption(oForm.options, "LAYOUT=COG"))
         BuildLevels(oTarget);
     oTarget.Get().Close();
 }

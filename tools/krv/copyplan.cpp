@@ -1,5 +1,6 @@
 #include "tools/krv/copyplan.h"
 
+#include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
@@ -9,6 +10,7 @@
 #include <fmt/format.h>
 
 #include <algorithm>
+#include <memory>
 #include <set>
 
 namespace krv::tool
@@ -95,6 +97,7 @@ void CopyPlan::ChooseTypes(const CopyRequest& oRequest)
     std::optional<krv::gobs::DataType> oType = oRequest.type;
     if (oRequest.promote)
         oType = krv::gobs::PromoteType(GetTypes());
+    mbTypesKept = !oType;
     for (CopiedChannel& oChannel : moChannels)
         oChannel.to = oType.value_or(oChannel.from);
 }
@@ -116,6 +119,21 @@ void CopyPlan::WarnOfLosses()
     mbLossy = !oConversions.empty();
     if (mbLossy)
         Warn(fmt::format("values may change in the conversion from {}", fmt::join(oConversions, ", ")));
+}
+
+unsigned int CopyPlan::GetNarrowBits() const
+{
+    unsigned int nAll = 0;
+    for (const CopiedChannel& oChannel : moChannels)
+    {
+        const std::unique_ptr<krv::datasources::IChannelInfo> poInfo(
+            moSources[oChannel.source]->GetRaster().GetChannelInfo(oChannel.channel));
+        const unsigned int nBits = poInfo->GetNativeDataType().GetBits();
+        if (!mbTypesKept || nBits >= oChannel.from.GetBits() || (nAll != 0 && nBits != nAll))
+            return 0;
+        nAll = nBits;
+    }
+    return nAll;
 }
 
 bool CopyPlan::IsCut() const

@@ -59,6 +59,9 @@ public:
     // Whether these are all channels of one file in its own order.
     bool IsWholeFile() const;
     std::vector<krv::gobs::DataType> GetTypes() const;
+    // The bits that all channels are stored with where these are less than their type has and the user asks for no
+    // type; else 0.
+    unsigned int GetNarrowBits() const;
 
 private:
     void CheckSizes() const;
@@ -70,6 +73,7 @@ private:
     std::vector<std::unique_ptr<SourceFile>> moSources;
     std::vector<CopiedChannel> moChannels;
     PixelWindow moWindow;
+    bool mbTypesKept = true; // the user asks for none
     bool mbLossy = false;
 };
 

@@ -282,6 +282,33 @@ std::uint32_t Widen(std::uint32_t nNumber)
                                                                                      << Format::SIGN_SHIFT;
 }
 
+// A number of 32 bits as one with fewer exponent and fraction bits, rounded half to even.
+template <unsigned int nExponentBits, unsigned int nFractionBits>
+std::uint32_t Narrow(std::uint32_t nNumber)
+{
+    using Format = NarrowFloat<nExponentBits, nFractionBits>;
+    constexpr std::uint32_t LOST_BITS = 23 - nFractionBits;
+    constexpr std::uint32_t FRACTION = 0x7FFFFFU;
+    constexpr std::uint32_t INFINITE_FLOAT = 0x7F800000U;
+    constexpr std::uint32_t SMALLEST_NORMAL = Format::BIAS_GAP + (1U << 23);
+    const auto oRound = [](std::uint32_t nValue, std::uint32_t nBits)
+    {
+        return (nValue + (1U << (nBits - 1)) - 1 + (nValue >> nBits & 1)) >> nBits;
+    };
+
+    const std::uint32_t nMagnitude = nNumber & 0x7FFFFFFFU;
+    const std::uint32_t nSign = nNumber >> Format::SIGN_SHIFT & ~Format::MAGNITUDE;
+    if (nMagnitude > INFINITE_FLOAT)
+    {
+        const std::uint32_t nPayload = (nMagnitude & FRACTION) >> LOST_BITS;
+        return nSign | Format::INFINITE | (nPayload != 0 ? nPayload : 1U << (nFractionBits - 1));
+    }
+    if (nMagnitude >= SMALLEST_NORMAL)
+        return nSign | std::min(oRound(nMagnitude - Format::BIAS_GAP, LOST_BITS), Format::INFINITE);
+    const std::uint32_t nShift = (SMALLEST_NORMAL >> 23) - (nMagnitude >> 23) + LOST_BITS;
+    return nSign | (nShift > 24 ? 0 : oRound((nMagnitude & FRACTION) | 1U << 23, nShift));
+}
+
 constexpr std::uint64_t ReverseEach(std::uint64_t nValue)
 {
     nValue = ((nValue >> 1) & 0x5555555555555555U) | ((nValue & 0x5555555555555555U) << 1);
@@ -375,6 +402,22 @@ void Float24ToFloat(const unsigned char* source, unsigned char* destination, std
         const unsigned char* at = source + i * 3;
         const std::uint32_t nLow = at[detail::LITTLE ? 0 : 2], nMiddle = at[1], nHigh = at[detail::LITTLE ? 2 : 0];
         Store(destination + i * 4, Widen<7, 16>(nHigh << 16 | nMiddle << 8 | nLow));
+    }
+}
+
+void FloatToHalf(const unsigned char* source, unsigned char* destination, std::size_t nCount)
+{
+    for (std::size_t i = 0; i < nCount; ++i)
+        Store(destination + i * 2, static_cast<std::uint16_t>(Narrow<5, 10>(Load<std::uint32_t>(source + i * 4))));
+}
+
+void FloatToFloat24(const unsigned char* source, unsigned char* destination, std::size_t nCount)
+{
+    for (std::size_t i = 0; i < nCount; ++i)
+    {
+        const std::uint32_t nNarrow = Narrow<7, 16>(Load<std::uint32_t>(source + i * 4));
+        for (std::size_t k = 0; k < 3; ++k)
+            destination[i * 3 + k] = static_cast<unsigned char>(nNarrow >> 8 * (detail::LITTLE ? k : 2 - k));
     }
 }
 

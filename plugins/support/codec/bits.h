@@ -33,6 +33,11 @@ void HalfToFloat(const unsigned char* source, unsigned char* destination, std::s
 // The same for 24 bits (7 of them exponent, bias 63; 16 fraction).
 void Float24ToFloat(const unsigned char* source, unsigned char* destination, std::size_t nCount);
 
+// The other way: to the nearest number of 16 or 24 bits, of two that are equally near to the even one. What is too
+// large becomes infinite; not-a-number stays so. Exact for what came from such numbers.
+void FloatToHalf(const unsigned char* source, unsigned char* destination, std::size_t nCount);
+void FloatToFloat24(const unsigned char* source, unsigned char* destination, std::size_t nCount);
+
 // Turns round the bits of every byte. In place is allowed.
 void ReverseBits(const unsigned char* source, unsigned char* destination, std::size_t nBytes);
 

@@ -63,6 +63,7 @@ struct Setting
 };
 
 constexpr std::uint32_t LARGEST_BLOCK = 65536;
+constexpr std::uint32_t LARGEST_SAMPLE_BITS = 64;
 
 bool ApplyLayout(const Setting& oSetting, CreateOptions& oOptions)
 {
@@ -75,6 +76,8 @@ bool ApplyLayout(const Setting& oSetting, CreateOptions& oOptions)
         oOptions.mnBlockHeight = oSetting.Number(1, LARGEST_BLOCK);
     else if (oSetting.moKey == "INTERLEAVE")
         oOptions.mbSeparate = oSetting.Choose<bool>({{"PIXEL", false}, {"BAND", true}});
+    else if (oSetting.moKey == "NBITS")
+        oOptions.mnSampleBits = oSetting.Number(1, LARGEST_SAMPLE_BITS);
     else if (oSetting.moKey == "BIGTIFF")
         oOptions.meBigTiff =
             oSetting.Choose<Choice>({{"AUTO", Choice::eAutomatic}, {"YES", Choice::eYes}, {"NO", Choice::eNo}});

@@ -26,6 +26,7 @@ struct CreateOptions
     std::optional<int> moLevel; // of the codec
     // 1 to 3, or 0: differences of integers, byte planes of reals, none for complex numbers.
     std::uint16_t mnPredictor = 0;
+    unsigned int mnSampleBits = 0; // stored; 0: as many as the type has
     bool mbSeparate = false;
     bool mbCloud = false; // directories first, levels from small to large
     Choice meBigTiff = Choice::eAutomatic;

@@ -38,15 +38,35 @@ std::uint16_t GetSampleFormat(const krv::gobs::DataType& oType)
     return oType.IsSigned() ? SAMPLEFORMAT_INT : SAMPLEFORMAT_UINT;
 }
 
+// Of one sample as it is stored: narrower than the type only where the type comes back when it is read.
+unsigned int ChooseBits(const NewImage& oImage, const CreateOptions& oOptions, const Place& oPlace)
+{
+    constexpr unsigned int MOST_PACKED_BITS = 32;
+    const krv::gobs::DataType& oType = oImage.moType;
+    const unsigned int nWhole = oType.GetValueBits();
+    const unsigned int nBits = oOptions.mnSampleBits == 0 ? nWhole : oOptions.mnSampleBits;
+    const bool bReal = oType.IsReal() && nWhole == 32 && (nBits == 16 || nBits == 24);
+    const bool bInteger =
+        !oType.IsReal() && nBits < nWhole && nBits <= MOST_PACKED_BITS && (nWhole == 8 || nBits > nWhole / 2);
+    if (nBits != nWhole && (oType.IsComplex() || !(bReal || bInteger)))
+        throw DataException("The option NBITS=" + std::to_string(nBits) + " does not go with values of type " +
+                                oType.Describe(),
+                            oPlace);
+    return nBits;
+}
+
 std::uint16_t ChoosePredictor(const NewImage& oImage, const CreateOptions& oOptions, const Place& oPlace)
 {
     if (!HasPredictor(oOptions.mnCompression))
         return PREDICTOR_NONE;
     const krv::gobs::DataType& oType = oImage.moType;
+    const bool bPacked = !oType.IsReal() && ChooseBits(oImage, oOptions, oPlace) != oType.GetValueBits();
     if (oOptions.mnPredictor == 0)
-        return oType.IsComplex() ? PREDICTOR_NONE : oType.IsReal() ? PREDICTOR_FLOATINGPOINT : PREDICTOR_HORIZONTAL;
+        return bPacked || oType.IsComplex() ? PREDICTOR_NONE
+               : oType.IsReal()             ? PREDICTOR_FLOATINGPOINT
+                                            : PREDICTOR_HORIZONTAL;
     const bool bFits = oOptions.mnPredictor == PREDICTOR_NONE ||
-                       (oOptions.mnPredictor == PREDICTOR_HORIZONTAL && !oType.IsComplex()) ||
+                       (oOptions.mnPredictor == PREDICTOR_HORIZONTAL && !oType.IsComplex() && !bPacked) ||
                        (oOptions.mnPredictor == PREDICTOR_FLOATINGPOINT && oType.IsReal() && !oType.IsComplex());
     if (!bFits)
         throw DataException("The option PREDICTOR=" + std::to_string(oOptions.mnPredictor) +
@@ -59,7 +79,7 @@ void CheckCodec(const NewImage& oImage, const CreateOptions& oOptions, const Pla
 {
     if (oOptions.mnCompression != COMPRESSION_JPEG)
         return;
-    const bool bBytes = oImage.moType == krv::gobs::DataType(krv::gobs::eDT_8U);
+    const bool bBytes = oImage.moType == krv::gobs::DataType(krv::gobs::eDT_8U) && oOptions.mnSampleBits % 8 == 0;
     if (!bBytes || (!oOptions.mbSeparate && oImage.mnChannels != 1 && oImage.mnChannels != 3))
         throw DataException("JPEG compression takes 8U values of one or three channels, or band interleaving", oPlace);
 }
@@ -183,7 +203,7 @@ std::shared_ptr<PageModel> MakeImagePage(const NewImage& oImage, const CreateOpt
     TagList& oTags = poPage->moTags;
     SetGeometry(oTags, oImage, oOptions);
     oTags.SetNumbers(TIFFTAG_BITSPERSAMPLE, TIFF_SHORT,
-                     std::vector<std::uint64_t>(oImage.mnChannels, oImage.moType.GetValueBits()));
+                     std::vector<std::uint64_t>(oImage.mnChannels, ChooseBits(oImage, oOptions, oPlace)));
     oTags.SetNumbers(TIFFTAG_SAMPLEFORMAT, TIFF_SHORT,
                      std::vector<std::uint64_t>(oImage.mnChannels, GetSampleFormat(oImage.moType)));
     oTags.SetNumber(TIFFTAG_SAMPLESPERPIXEL, TIFF_SHORT, oImage.mnChannels);

@@ -66,11 +66,12 @@ StrileEncoder::~StrileEncoder() = default;
 std::string StrileEncoder::FindObstacle() const
 {
     const SampleForm& oSample = moForm.moSample;
-    const bool bPacked = oSample.meWidening == Widening::eBits && oSample.mnPartBits <= MOST_PACKED_BITS &&
-                         oSample.mnParts == 1 && oSample.mnPartBits % 8 != 0;
+    const bool bReal = oSample.meWidening == Widening::eHalf || oSample.meWidening == Widening::eFloat24;
+    const bool bPacked = oSample.mnParts == 1 && oSample.mnPartBits <= MOST_PACKED_BITS &&
+                         (oSample.meWidening == Widening::eThreeBytes || !oSample.IsWhole());
     if (moForm.mbReversedBits)
         return "bytes with their lowest bit first";
-    if (oSample.meWidening != Widening::eNone && !(bPacked && moForm.mnPredictor == PREDICTOR_NONE))
+    if (oSample.meWidening != Widening::eNone && !bReal && !(bPacked && moForm.mnPredictor == PREDICTOR_NONE))
         return "samples of " + std::to_string(oSample.GetBits()) + " bits";
     if (moForm.mnCompression != COMPRESSION_NONE && !IsOwnCodec(moForm.mnCompression) &&
         !(IsLibraryCodec(moForm.mnCompression) && TIFFIsCODECConfigured(moForm.mnCompression) != 0))
@@ -92,40 +93,55 @@ bool StrileEncoder::IsPlain() const
            meUse == PixelUse::eImage;
 }
 
-// Values of other widths than whole bytes: packed, most significant bit first; what does not fit becomes the nearest
-// value that does.
+// Values of fewer bits than they are handed in with. Reals become the nearest of their width.
 StrileEncoder::Rows StrileEncoder::Narrow(const Rows& oRows, std::uint32_t nWidth, std::uint32_t nRows)
 {
     const SampleForm& oSample = moForm.moSample;
-    const bool bMask = meUse == PixelUse::eBitmap;
-    if (oSample.meWidening == Widening::eNone && !bMask)
+    if (oSample.meWidening == Widening::eNone && meUse != PixelUse::eBitmap)
         return oRows;
     const std::size_t nSamples = std::size_t{nWidth} * moForm.GetPlaneChannels();
-    const std::size_t nValueBytes = bMask ? 1 : oSample.GetValueBytes();
     const std::size_t nPitch = moForm.GetStoredRowBytes(nWidth);
-    const unsigned int nBits = oSample.GetBits();
-    const std::int64_t nHighest = (std::int64_t{1} << (nBits - (oSample.IsSigned() ? 1 : 0))) - 1;
-    const std::int64_t nLowest = oSample.IsSigned() ? -nHighest - 1 : 0;
     unsigned char* pTarget = moNarrow.Get(nPitch * nRows);
-    std::memset(pTarget, 0, nPitch * nRows);
     for (std::uint32_t nRow = 0; nRow < nRows; ++nRow)
     {
         const unsigned char* pRow = oRows.mpFirst + nRow * oRows.mnPitch;
-        std::uint64_t nPending = 0;
-        unsigned int nHeld = 0;
-        unsigned char* pNext = pTarget + nRow * nPitch;
-        for (std::size_t nAt = 0; nAt < nSamples; ++nAt)
-        {
-            const std::int64_t nValue = ReadSample(pRow + nAt * nValueBytes, nValueBytes, oSample.IsSigned());
-            const std::int64_t nFitted = bMask ? (nValue != 0 ? nHighest : 0) : std::clamp(nValue, nLowest, nHighest);
-            nPending = nPending << nBits | (static_cast<std::uint64_t>(nFitted) & ((std::uint64_t{1} << nBits) - 1));
-            for (nHeld += nBits; nHeld >= 8; nHeld -= 8)
-                *pNext++ = static_cast<unsigned char>(nPending >> (nHeld - 8));
-        }
-        if (nHeld > 0)
-            *pNext = static_cast<unsigned char>(nPending << (8 - nHeld));
+        unsigned char* pNarrow = pTarget + nRow * nPitch;
+        if (oSample.meWidening == Widening::eHalf)
+            codec::FloatToHalf(pRow, pNarrow, nSamples * oSample.mnParts);
+        else if (oSample.meWidening == Widening::eFloat24)
+            codec::FloatToFloat24(pRow, pNarrow, nSamples * oSample.mnParts);
+        else
+            Pack(pRow, pNarrow, nSamples);
     }
     return {pTarget, nPitch};
+}
+
+// Packed, most significant bit first; what does not fit becomes the nearest value that does. Numbers of three bytes
+// come out in this machine's order.
+void StrileEncoder::Pack(const unsigned char* pRow, unsigned char* pNext, std::size_t nSamples) const
+{
+    const SampleForm& oSample = moForm.moSample;
+    const bool bMask = meUse == PixelUse::eBitmap;
+    const bool bTurn = oSample.meWidening == Widening::eThreeBytes && !BIG_ENDIAN_MACHINE;
+    const std::size_t nValueBytes = bMask ? 1 : oSample.GetValueBytes();
+    const unsigned int nBits = oSample.GetBits();
+    const std::int64_t nHighest = (std::int64_t{1} << (nBits - (oSample.IsSigned() ? 1 : 0))) - 1;
+    const std::int64_t nLowest = oSample.IsSigned() ? -nHighest - 1 : 0;
+    std::uint64_t nPending = 0;
+    unsigned int nHeld = 0;
+    unsigned char* const pFirst = pNext;
+    for (std::size_t nAt = 0; nAt < nSamples; ++nAt)
+    {
+        const std::int64_t nValue = ReadSample(pRow + nAt * nValueBytes, nValueBytes, oSample.IsSigned());
+        const std::int64_t nFitted = bMask ? (nValue != 0 ? nHighest : 0) : std::clamp(nValue, nLowest, nHighest);
+        nPending = nPending << nBits | (static_cast<std::uint64_t>(nFitted) & ((std::uint64_t{1} << nBits) - 1));
+        for (nHeld += nBits; nHeld >= 8; nHeld -= 8)
+            *pNext++ = static_cast<unsigned char>(nPending >> (nHeld - 8));
+    }
+    if (nHeld > 0)
+        *pNext = static_cast<unsigned char>(nPending << (8 - nHeld));
+    if (bTurn)
+        codec::SwapBytes(pFirst, pFirst, nSamples, 3);
 }
 
 StrileEncoder::Rows StrileEncoder::Pad(const Rows& oRows, std::uint32_t nWidth, std::uint32_t nRows,
@@ -175,7 +191,7 @@ StrileEncoder::Rows StrileEncoder::Order(const Rows& oRows, std::uint32_t nStore
         return {pTarget, nPitch};
     }
     const std::size_t nPartBytes = oSample.mnPartBits / 8;
-    const bool bTurn = !bLibrary && bSwapped && nPartBytes > 1 && oSample.meWidening == Widening::eNone;
+    const bool bTurn = !bLibrary && bSwapped && nPartBytes > 1 && oSample.meWidening != Widening::eBits;
     if (!bTurn && oRows.mnPitch == nPitch)
         return oRows;
     unsigned char* pTarget = moOrdered.Get(nPitch * nStoredRows);

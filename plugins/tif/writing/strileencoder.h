@@ -48,6 +48,7 @@ private:
 
     std::string FindObstacle() const;
     Rows Narrow(const Rows& oRows, std::uint32_t nWidth, std::uint32_t nRows);
+    void Pack(const unsigned char* pRow, unsigned char* pNext, std::size_t nSamples) const;
     Rows Pad(const Rows& oRows, std::uint32_t nWidth, std::uint32_t nRows, std::uint32_t nStoredRows);
     Rows Order(const Rows& oRows, std::uint32_t nStoredRows);
     std::span<const unsigned char> Compress(const unsigned char* pStored, std::size_t nBytes,

@@ -1,8 +1,10 @@
 #include "tests/plugins/tifwriting/writingsupport.h"
 #include "toolkit/exceptions/exceptions.h"
 
+#include <algorithm>
 #include <cstring>
 #include <filesystem>
+#include <random>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -130,6 +132,65 @@ TEST(TifCreate, BlocksThatWereNeverWrittenReadAsZeroAndTakeNoRoom)
     EXPECT_EQ(ReadAll(*poUpdated), oPixels);
 }
 
+// Integers are limited to their bits, reals rounded to the nearest, of two the even.
+TEST(TifCreate, NarrowSamplesAreTheNearestThatFit)
+{
+    struct Narrow
+    {
+        krv::gobs::NativeDataTypeCode meType;
+        std::vector<unsigned int> moBits;
+    };
+    const Narrow NARROW[] = {{krv::gobs::eDT_8U, {1, 2, 4, 7}},  {krv::gobs::eDT_8S, {3, 7}},
+                             {krv::gobs::eDT_16U, {9, 12, 15}},  {krv::gobs::eDT_16S, {10}},
+                             {krv::gobs::eDT_32U, {17, 24, 31}}, {krv::gobs::eDT_32S, {24, 20}},
+                             {krv::gobs::eDT_32R, {16}}};
+    const auto Fit = [](const DataType& oType, unsigned int nBits, unsigned char* pValue)
+    {
+        if (oType.IsReal())
+        {
+            float nValue;
+            std::memcpy(&nValue, pValue, sizeof(nValue));
+            nValue = static_cast<float>(static_cast<_Float16>(nValue));
+            return std::memcpy(pValue, &nValue, sizeof(nValue)), void();
+        }
+        std::int64_t nValue = oType.IsSigned() && (pValue[oType.GetBits() / 8 - 1] & 0x80) != 0 ? -1 : 0;
+        std::memcpy(&nValue, pValue, oType.GetBits() / 8);
+        const std::int64_t nHighest = (std::int64_t{1} << (nBits - (oType.IsSigned() ? 1 : 0))) - 1;
+        nValue = std::clamp(nValue, oType.IsSigned() ? -nHighest - 1 : 0, nHighest);
+        std::memcpy(pValue, &nValue, oType.GetBits() / 8);
+    };
+    const TempFolder oFolder;
+    unsigned int nSeed = 0;
+    for (const Narrow& oNarrow : NARROW)
+        for (const unsigned int nBits : oNarrow.moBits)
+            for (const char* pForm : {"", "TILED=NO COMPRESS=LZW INTERLEAVE=BAND", "COMPRESS=ZSTD"})
+            {
+                const DataType oType(oNarrow.meType);
+                const std::size_t nBytes = oType.GetBits() / 8;
+                const std::string fileName = oFolder.File("narrow.tif");
+                SCOPED_TRACE(oType.Describe() + " in " + std::to_string(nBits) + " bits " + pForm);
+                Bytes oPixels = MakePixels(61, 37, 3, oNarrow.meType, ++nSeed);
+                std::mt19937 oRandom(nSeed);
+                for (std::size_t nAt = 0; nAt < oPixels.size(); nAt += 2 * nBytes)
+                {
+                    // Half of them fit; reals lie about the ends of the range, some halfway between two.
+                    const std::uint32_t nReal = (95 + oRandom() % 50) << 23 | (oRandom() & 0x7FF000U);
+                    if (oType.IsReal())
+                        std::memcpy(&oPixels[nAt], &nReal, nBytes);
+                    else
+                        std::fill_n(&oPixels[nAt + nBits / 8], nBytes - nBits / 8, 0);
+                }
+                TifPointer poDataset =
+                    CreateTif(fileName, "NBITS=" + std::to_string(nBits) + " " + pForm, 61, 37, 3, oNarrow.meType);
+                WriteAll(*poDataset, oPixels);
+                poDataset->Close();
+                for (std::size_t nAt = 0; nAt < oPixels.size(); nAt += nBytes)
+                    Fit(oType, nBits, &oPixels[nAt]);
+                EXPECT_TRUE(ReadAll(*OpenTif(fileName)) == oPixels);
+                EXPECT_EQ(Judge(fileName).moComplaints, "");
+            }
+}
+
 TEST(TifCreate, OptionsAndTypesThatDoNotGoTogetherAreNamed)
 {
     const TempFolder oFolder;
@@ -157,6 +218,9 @@ TEST(TifCreate, OptionsAndTypesThatDoNotGoTogetherAreNamed)
     EXPECT_THAT(Message("COMPRESS=ZSTD PREDICTOR=3", oBytes), testing::HasSubstr("8U"));
     EXPECT_THAT(Message("COMPRESS=JPEG", {krv::gobs::eDT_16U}), testing::HasSubstr("JPEG"));
     EXPECT_THAT(Message("ALPHA=YES", oBytes), testing::HasSubstr("ALPHA"));
+    EXPECT_THAT(Message("NBITS=9", oBytes), testing::HasSubstr("NBITS=9"));
+    EXPECT_THAT(Message("NBITS=8", {krv::gobs::eDT_16U}), testing::HasSubstr("16U"));
+    EXPECT_THAT(Message("NBITS=4 COMPRESS=JPEG", oBytes), testing::HasSubstr("JPEG"));
     const std::string mixed = Message("", {krv::gobs::eDT_8U, krv::gobs::eDT_8U, krv::gobs::eDT_32R});
     EXPECT_THAT(mixed, testing::HasSubstr("8U"));
     EXPECT_THAT(mixed, testing::HasSubstr("32R"));

@@ -27,6 +27,7 @@ constexpr std::pair<const char*, const char*> CAPABILITIES[] = {
     {"create", CAPABILITY_CREATE},
     {"metadata", CAPABILITY_METADATA},
     {"georeferencing", CAPABILITY_GEOREFERENCING},
+    {"narrowSamples", CAPABILITY_NARROW_SAMPLES},
     {"createBitmap", CAPABILITY_BITMAP_CREATE},
     {"deleteBitmap", CAPABILITY_BITMAP_DELETE},
     {"createControlPoint", CAPABILITY_CONTROL_POINT_CREATE},
