@@ -183,6 +183,8 @@ void ValiditySource::FindBitmap(IDataset& oDataset)
         if (!poBitmaps->GetBitmapDescription(nBitmap).empty())
             continue;
         mpoBitmapReader = std::make_unique<BasicReader>(poBitmaps, std::vector<unsigned int>{nBitmap}, false);
+        if (mpoBitmapReader->GetWidth() != mnImageWidth || mpoBitmapReader->GetHeight() != mnImageHeight)
+            throw krv::DataException("Bitmap " + std::to_string(nBitmap) + " is not of the image's size");
         return;
     }
 }

@@ -113,7 +113,7 @@ void OverviewBuilder::FindMask()
 {
     auto& oBitmaps = dynamic_cast<IBitmapDataset&>(*mpoDataset);
     const std::vector<unsigned int> oList = oBitmaps.GetBitmapList();
-    if (!oBitmaps.GetBitmapDescription(oList.front()).empty())
+    if (oList.empty() || !oBitmaps.GetBitmapDescription(oList.front()).empty())
         return;
     mpoMaskManager.reset(oBitmaps.GetBitmapOverviewManager());
     mnMask = mpoMaskManager != nullptr ? oList.front() : 0;
@@ -273,7 +273,7 @@ void OverviewBuilder::MakeReducers()
                 RoundUp(moBounds.mnRight, moForm.mnWidth), RoundUp(moBounds.mnBottom, moForm.mnHeight)};
     mnTotal = std::uint64_t{moBounds.GetWidth()} * moBounds.GetHeight();
     mnWindowWidth = moBounds.GetWidth();
-    const std::uint64_t nAligned = std::lcm<std::uint64_t>(moWriter.GetTileWidth(), nUnit);
+    const std::uint64_t nAligned = std::lcm<std::uint64_t>(std::max(moWriter.GetTileWidth(), 1U), nUnit);
     if (moReducers.empty() && nAligned <= WINDOW_WIDTH)
         mnWindowWidth = static_cast<unsigned int>(nAligned);
     if (!oCascade.empty())
@@ -314,7 +314,7 @@ bool OverviewBuilder::Run()
 {
     const std::uint64_t nRowBytes = std::max<std::uint64_t>(1, mnWindowWidth * moForm.GetPixelBytes());
     const std::uint64_t nMostRows = std::max<std::uint64_t>(1, WINDOW_BYTES / nRowBytes);
-    const std::uint64_t nTileHeight = moWriter.GetTileHeight();
+    const std::uint64_t nTileHeight = std::max(moWriter.GetTileHeight(), 1U);
     for (unsigned int nTop = moBounds.mnTop; nTop < moBounds.mnBottom;)
     {
         const std::uint64_t nTileEnd = (nTop / nTileHeight + 1) * nTileHeight;

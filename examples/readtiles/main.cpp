@@ -40,6 +40,12 @@ catch (const krv::FileNotFoundException& oError)
     std::cerr << "readtiles: there is no file " << oError.GetFileName() << "\n";
     return 1;
 }
+catch (const krv::FileException& oError)
+{
+    // The manager itself says no more than that no format takes the file: the message is empty then.
+    std::cerr << "readtiles: " << oError.GetFileName() << " cannot be read. " << oError.GetMessage() << "\n";
+    return 1;
+}
 catch (const std::exception& oError)
 {
     std::cerr << "readtiles: " << oError.what() << "\n";

@@ -63,6 +63,8 @@ std::string SystemErrorText(int nError)
 std::string MakeTemporaryName(const std::string& fileName, const Place& oPlace)
 {
     struct stat oStatus = {};
+    if (fileName.empty() || fileName.back() == '/')
+        throw IOException(fileName, "\"" + fileName + "\": a new file has a name", oPlace);
     if (::stat(fileName.c_str(), &oStatus) == 0 && !S_ISREG(oStatus.st_mode))
         throw IOException(fileName, fileName + ": is not a plain file and is not replaced", oPlace);
     if (::access(fileName.c_str(), W_OK) != 0 && errno != ENOENT && errno != ENOTDIR)
@@ -70,8 +72,13 @@ std::string MakeTemporaryName(const std::string& fileName, const Place& oPlace)
     const std::size_t nSlash = fileName.rfind('/');
     const std::size_t nBegin = nSlash == std::string::npos ? 0 : nSlash + 1;
     const std::string folder = nBegin == 0 ? "." : fileName.substr(0, nBegin == 1 ? 1 : nBegin - 1);
-    if (::stat(folder.c_str(), &oStatus) != 0 && (errno == ENOENT || errno == ENOTDIR))
-        throw FileNotFoundException(fileName, fileName + ": there is no folder " + folder + " to create it in", oPlace);
+    if (::access(folder.c_str(), W_OK | X_OK) != 0)
+    {
+        if (errno == ENOENT || errno == ENOTDIR)
+            throw FileNotFoundException(fileName, fileName + ": there is no folder " + folder + " to create it in",
+                                        oPlace);
+        throw IOException(fileName, fileName + ": cannot be created: " + SystemErrorText(errno), oPlace);
+    }
     static std::atomic<unsigned int> nCounter = 0;
     return fileName.substr(0, nBegin) + "." + fileName.substr(nBegin, 200) + "." + std::to_string(::getpid()) + "." +
            std::to_string(nCounter++) + ".part";
@@ -100,6 +107,7 @@ File::File(const std::string& fileName, Mode eMode, const Place& oPlace) : moNam
     if (::fstat(mnDescriptor, &oStatus) != 0)
         oStatus.st_size = 0;
     mnSize = static_cast<std::uint64_t>(oStatus.st_size);
+    mbLinked = oStatus.st_nlink != 0;
 }
 
 File::~File()
@@ -194,6 +202,9 @@ void File::Flush(const Place& oPlace)
 {
     if (::fdatasync(mnDescriptor) != 0)
         throw IOException(moName, moName + ": writing failed: " + SystemErrorText(errno), oPlace);
+    struct stat oStatus = {};
+    if (mbLinked && ::fstat(mnDescriptor, &oStatus) == 0 && oStatus.st_nlink == 0)
+        throw IOException(moName, moName + ": was removed or replaced while it was being written", oPlace);
 }
 
 void File::CutBack(std::uint64_t nBytes) noexcept

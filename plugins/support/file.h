@@ -57,7 +57,8 @@ public:
     void WriteRows(std::uint64_t nOffset, std::size_t nStoredPitch, std::size_t nRowBytes, std::size_t nRows,
                    const unsigned char* pSource, std::size_t nPitch, Location oLocation = Location::current());
 
-    // Makes sure that what was written reaches the disk.
+    // Makes sure that what was written reaches the disk. Throws when the file lost its name meanwhile: nobody would
+    // find it again.
     void Flush(const Place& oPlace = Place::Current());
 
     // Cuts off what this object wrote behind nBytes, unless somebody else wrote there too. Failures leave the file as
@@ -79,12 +80,13 @@ private:
     std::string moPath;
     int mnDescriptor = -1;
     std::uint64_t mnSize = 0;
+    bool mbLinked = false; // some file systems do not count names
 };
 
 // A name for what becomes fileName when it is whole: in the same folder, so that it can be renamed, of no length that a
 // folder does not take, and of this process alone. Throws FileNotFoundException when there is no such folder, and
-// IOException when a folder, a device or the like has the name, or a file that must not be written: renaming would put
-// the file in its place.
+// IOException when the folder must not be written, when a folder, a device or the like has the name, or a file that
+// must not be written: renaming would put the file in its place.
 std::string MakeTemporaryName(const std::string& fileName, const Place& oPlace = Place::Current());
 
 // The text of an error number, in the C locale.

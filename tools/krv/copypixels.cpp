@@ -5,8 +5,11 @@
 #include "gobs/raster/buffertype.h"
 #include "gobs/raster/raster.h"
 #include "toolkit/core/hmalloc.h"
+#include "toolkit/exceptions/exceptions.h"
 #include "toolkit/raster/merger.h"
 #include "tools/krv/progress.h"
+
+#include <fmt/format.h>
 
 #include <algorithm>
 #include <memory>
@@ -110,6 +113,9 @@ void MakeMerger(const std::vector<CopySource>& oSources, const IRasterWriter& oW
 void CopyPixels(const std::vector<CopySource>& oSources, IRasterWriter& oWriter, const PixelWindow& oWindow,
                 Progress& oProgress)
 {
+    if (oWriter.GetWidth() != oWindow.width || oWriter.GetHeight() != oWindow.height)
+        throw krv::DataException(fmt::format("what was laid out with {} x {} pixels says to be of {} x {}",
+                                             oWindow.width, oWindow.height, oWriter.GetWidth(), oWriter.GetHeight()));
     const PieceSize oSize = ChoosePiece(oSources, oWriter);
     const std::uint64_t nPixels = std::uint64_t{oSize.width} * oSize.height;
     const bool bDirect = oSources.size() == 1 && IsDirect(oSources.front(), oWriter);

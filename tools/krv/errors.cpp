@@ -112,9 +112,29 @@ std::string DataText(const krv::Exception& oError, const std::string& file)
     return WithFile(file, oError.GetMessage().empty() ? "it failed without saying why" : oError.GetMessage());
 }
 
+// What to do, by the system's own words at the end of the message.
+const char* IoRemedy(const std::string& message)
+{
+    for (const int nError : {ENOSPC, EDQUOT, EFBIG})
+    {
+        if (message.ends_with(std::strerror(nError)))
+            return "make room there, or name a file elsewhere";
+    }
+    for (const int nError : {EACCES, EPERM, EROFS})
+    {
+        if (message.ends_with(std::strerror(nError)))
+            return "get the right to write there, or name a file elsewhere";
+    }
+    return message.ends_with("by another program or dataset") ? "try again when that is done"
+                                                              : "is the file complete and its disk sound?";
+}
+
+// Some messages say what to do themselves.
 std::string IoText(const krv::IOException& oError)
 {
-    return WithFile(oError.GetFileName(), oError.GetMessage()) + "; is the file complete and its disk sound?";
+    const std::string& message = oError.GetMessage();
+    const std::string remedy = message.find("; ") == std::string::npos ? std::string("; ") + IoRemedy(message) : "";
+    return WithFile(oError.GetFileName(), message) + remedy;
 }
 
 std::string XmlText(const std::string& message)

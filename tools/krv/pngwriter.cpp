@@ -72,9 +72,15 @@ private:
 
 void IgnoreWarning(png_structp, png_const_charp) {}
 
+// The caller tells what failed, by the system's error number.
+[[noreturn]] void LeaveQuietly(png_structp pPng, png_const_charp)
+{
+    png_longjmp(pPng, 1);
+}
+
 struct PngWriteStruct
 {
-    png_structp mpPng = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, nullptr, &IgnoreWarning);
+    png_structp mpPng = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, &LeaveQuietly, &IgnoreWarning);
     png_infop mpInfo = mpPng != nullptr ? png_create_info_struct(mpPng) : nullptr;
 
     PngWriteStruct() = default;

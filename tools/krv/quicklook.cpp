@@ -6,6 +6,7 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/reader/basicreader.h"
 #include "gobs/pct/pct.h"
+#include "toolkit/exceptions/exceptions.h"
 #include "tools/krv/displaychoice.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/progress.h"
@@ -103,6 +104,8 @@ void ApplyMask(const SourceFile& oFile, unsigned int nBitmap, const Size& oSize,
 {
     auto* const poBitmaps = dynamic_cast<krv::datasources::IBitmapDataset*>(&oFile.GetDataset());
     krv::datasources::BasicReader oReader(poBitmaps, {nBitmap}, false);
+    if (oReader.GetWidth() != oFile.GetRaster().GetWidth() || oReader.GetHeight() != oFile.GetRaster().GetHeight())
+        throw krv::DataException(fmt::format("{}: bitmap {} is not of the image's size", oFile.GetName(), nBitmap));
     Progress oProgress("mask", ReaderBytes(oReader));
     const auto oPlanes = Reduce(oReader, {std::nullopt}, oSize.width, oSize.height, Reduction::eAverage, oProgress);
     Multiply(oOpacity, oPlanes.front(), 1.0F);

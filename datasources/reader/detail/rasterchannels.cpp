@@ -109,10 +109,17 @@ OpenedChannels OpenChannels(IRasterDataset& oDataset, const std::vector<unsigned
         oOpened.moInfos.Add(std::move(oInfo));
     }
     oOpened.moType = oOpened.moInfos.Get().front()->GetDataType();
-    oOpened.mpoRasterIO = std::move(oRasterIO);
-    if (oOpened.mpoRasterIO == nullptr)
-        oOpened.mpoRasterIO.reset(oDataset.GetRasterIO(oChannels));
+    krv::gobs::NativeDataTypeCode eCode{};
+    if (!oOpened.moType.FindNativeCode(eCode) || eCode == krv::gobs::eDT_BIT)
+        throw krv::DataException("Channel " + std::to_string(oChannels.front()) + " is of the type " +
+                                     oOpened.moType.Describe() + ", which no I/O hands out",
+                                 oPlace);
+    const bool bWholeImage = oRasterIO == nullptr;
+    oOpened.mpoRasterIO =
+        bWholeImage ? std::unique_ptr<IRasterIO>(oDataset.GetRasterIO(oChannels)) : std::move(oRasterIO);
     MeasureImage(oOpened, oPlace);
+    if (bWholeImage && (oOpened.mnWidth != oDataset.GetWidth() || oOpened.mnHeight != oDataset.GetHeight()))
+        throw krv::DataException("The dataset and its raster I/O are of different sizes", oPlace);
     return oOpened;
 }
 

@@ -9,8 +9,9 @@ namespace krv::datasources::detail
 
 TileGatherer::TileGatherer(const PixelBounds& oBounds, unsigned int nTileWidth, unsigned int nTileHeight,
                            unsigned int nChannels, const krv::gobs::DataType& oType, Store oStore)
-    : moBounds(oBounds), mnTileWidth(nTileWidth), mnTileHeight(nTileHeight), mnChannels(nChannels), moType(oType),
-      mnPixelBytes(oType.GetValueBits() / 8 * nChannels), moStore(std::move(oStore))
+    : moBounds(oBounds), mnTileWidth(std::max(nTileWidth, 1U)), mnTileHeight(std::max(nTileHeight, 1U)),
+      mnChannels(nChannels), moType(oType), mnPixelBytes(oType.GetValueBits() / 8 * nChannels),
+      moStore(std::move(oStore))
 {
 }
 

@@ -320,6 +320,10 @@ TEST(TifUpdate, AFullDiskAndAMissingFolderAreReported)
     TifPointer poDataset = CreateTif(oFolder.File("gone/a.tif"), "", 40, 40, 1, krv::gobs::eDT_8U);
     std::filesystem::remove_all(oFolder.GetPath() + "/gone");
     EXPECT_THROW(poDataset->Synchronize(), krv::IOException);
+    TifPointer poRemoved = OpenTif(fileName, eUpdate);
+    std::filesystem::remove(fileName);
+    WriteAll(*poRemoved, Bytes(400 * 400, 4));
+    EXPECT_THROW(poRemoved->Synchronize(), krv::IOException);
     EXPECT_THROW(CreateTif(oFolder.GetPath() + "/none/a.tif", "", 40, 40, 1, krv::gobs::eDT_8U), krv::FileException);
     EXPECT_THROW(OpenTif(oFolder.Write("text.tif", "no image"), eUpdate), krv::FileException);
 }
