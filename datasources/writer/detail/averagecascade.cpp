@@ -34,17 +34,11 @@ struct BoxRow
     std::uint64_t GetSize(std::size_t nBox) const { return mnRows * (nBox + 1 == mnBoxes ? mnLastColumns : mnColumns); }
 };
 
-// Two short rows at a time are no pattern that processors fetch ahead of by
-// themselves; of long ones each is.
+// Two short rows at a time are no pattern that processors fetch ahead of by themselves; of long ones each is.
 constexpr std::size_t LONGEST_FETCHED_ROW = 4096;
-constexpr std::size_t FETCHED_AHEAD = 4096;
-constexpr std::size_t FETCHED_LINE = 64;
-
-void Fetch(const unsigned char* pBytes, std::size_t nBytes)
-{
-    for (std::size_t n = 0; n < nBytes; n += FETCHED_LINE)
-        __builtin_prefetch(pBytes + n);
-}
+// A block of the image and the sums of its first stage stay in the nearest cache.
+constexpr std::size_t BLOCK_BYTES = 32768;
+constexpr unsigned int BLOCK_STAGES = 5;
 
 // The steps of a cascade: stage k holds sums of 2^k by 2^k pixels.
 class IAverageSteps
@@ -58,6 +52,8 @@ public:
     // as if they were whole, to pPixels unless that is null; gives their number.
     virtual std::size_t Sum(unsigned int nStage, const SumRow& oFirst, const SumRow& oSecond, std::size_t nPixels,
                             const SumRow& oSums, unsigned char* pPixels) const = 0;
+    // Does the same for blocks of whole boxes; null where only Sum can.
+    virtual ReduceLoop GetLoop(unsigned int) const { return nullptr; }
     // Pixels of a level from box nFirst on, and with counts the validity of their
     // values.
     virtual void Finish(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, std::size_t nFirst,
@@ -155,101 +151,100 @@ private:
     mutable std::vector<T> moSecond;
 };
 
-#if defined(KRV_VECTOR_AVERAGES)
-// By vector instructions, without validity. Wide: the sums from the fifth stage
-// on, where they outgrow the narrow ones.
-template <typename T, typename Narrow, typename Wide>
+// By vector instructions, without validity, in sums as narrow as a stage allows.
+template <typename T>
 class VectorSteps : public IAverageSteps
 {
 public:
-    static constexpr unsigned int NARROW_STAGES = 4;
-    static constexpr unsigned int MOST_STAGES = 8;
-
-    explicit VectorSteps(const SourceForm& oForm) : mnSamples(oForm.GetSamples()) {}
+    explicit VectorSteps(const SourceForm& oForm) : meType(oForm.moType.GetNativeCode()), mnSamples(oForm.GetSamples())
+    {
+    }
 
     std::size_t GetSumBytes(unsigned int nStage) const override
     {
-        return nStage == 0 ? sizeof(T) : nStage <= NARROW_STAGES ? sizeof(Narrow) : sizeof(Wide);
+        if (nStage == 0)
+            return sizeof(T);
+        const std::size_t nBits = 8 * sizeof(T) + 2 * nStage;
+        return std::is_floating_point_v<T> || nBits > 32 ? 8 : nBits > 16 ? 4 : 2;
+    }
+
+    ReduceLoop GetLoop(unsigned int nStage) const override
+    {
+        return FindReduceLoop(meType, mnSamples, GetSumBytes(nStage - 1), GetSumBytes(nStage));
     }
 
     std::size_t Sum(unsigned int nStage, const SumRow& oFirst, const SumRow& oSecond, std::size_t nPixels,
-                    const SumRow& oSums, [[maybe_unused]] unsigned char* pPixels) const override
+                    const SumRow& oSums, unsigned char* pPixels) const override
     {
-        if (nStage == 1)
-            return Add<T, Narrow>(oFirst, oSecond, nPixels, oSums, pPixels);
-        if (nStage <= NARROW_STAGES)
-            return Add<Narrow, Narrow>(oFirst, oSecond, nPixels, oSums);
-        if (nStage == NARROW_STAGES + 1)
-            return Add<Narrow, Wide>(oFirst, oSecond, nPixels, oSums);
-        return Add<Wide, Wide>(oFirst, oSecond, nPixels, oSums);
+        GetLoop(nStage)(
+            {oFirst.mpSums, oSecond.mpSums, 0, nPixels / 2, 1, oSums.mpSums, 0, pPixels, 0, 2 * nStage, false});
+        for (std::size_t n = 0; n < mnSamples && nPixels % 2 != 0; ++n)
+        {
+            const std::size_t nAt = (nPixels - 1) * mnSamples + n;
+            const SumOf<T> nSum = Get(oFirst, nStage - 1, nAt) + Get(oSecond, nStage - 1, nAt);
+            Set(oSums, nStage, nPixels / 2 * mnSamples + n, nSum);
+        }
+        return nPixels / 2;
     }
 
     void Finish(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, std::size_t nFirst,
                 unsigned char* pPixels, unsigned char*) const override
     {
-        if (nStage <= NARROW_STAGES)
-            Round<Narrow>(nStage, oSums, oBoxes, nFirst, reinterpret_cast<T*>(pPixels));
-        else
-            Round<Wide>(nStage, oSums, oBoxes, nFirst, reinterpret_cast<T*>(pPixels));
+        for (std::size_t nBox = nFirst; nBox < oBoxes.mnBoxes; ++nBox)
+            for (std::size_t n = nBox * mnSamples; n < (nBox + 1) * mnSamples; ++n)
+            {
+                const T nMean = MeanOf<T>(Get(oSums, nStage, n), oBoxes.GetSize(nBox));
+                std::memcpy(pPixels + n * sizeof(T), &nMean, sizeof(T));
+            }
     }
 
 private:
-    template <typename In, typename Out>
-    std::size_t Add(const SumRow& oFirst, const SumRow& oSecond, std::size_t nPixels, const SumRow& oSums,
-                    [[maybe_unused]] unsigned char* pPixels = nullptr) const
+    // Calls oAction with a value of the type that a stage's sums have.
+    template <typename Action>
+    auto As(unsigned int nStage, const Action& oAction) const
     {
-        const auto* const pFirst = reinterpret_cast<const In*>(oFirst.mpSums);
-        const auto* const pSecond = reinterpret_cast<const In*>(oSecond.mpSums);
-        auto* const pSums = reinterpret_cast<Out*>(oSums.mpSums);
-        std::size_t nRounded = 0;
-        if constexpr (sizeof(In) == 1)
-        {
-            SumAndRoundPairs(pFirst, pSecond, nPixels / 2, mnSamples, pSums, pPixels);
-            nRounded = pPixels != nullptr ? nPixels / 2 : 0;
-        }
-        else
-            SumPairs(pFirst, pSecond, nPixels / 2, mnSamples, pSums);
-        for (std::size_t n = 0; n < mnSamples && nPixels % 2 != 0; ++n)
-        {
-            const std::size_t nAt = (nPixels - 1) * mnSamples + n;
-            pSums[nPixels / 2 * mnSamples + n] = static_cast<Out>(Out(pFirst[nAt]) + Out(pSecond[nAt]));
-        }
-        return nRounded;
+        if (nStage == 0)
+            return oAction(T());
+        if constexpr (std::is_floating_point_v<T>)
+            return oAction(SumOf<T>());
+        const std::size_t nBytes = GetSumBytes(nStage);
+        return nBytes == 2   ? oAction(std::uint16_t())
+               : nBytes == 4 ? oAction(std::uint32_t())
+                             : oAction(std::uint64_t());
+    }
+    SumOf<T> Get(const SumRow& oRow, unsigned int nStage, std::size_t nAt) const
+    {
+        return As(nStage,
+                  [&](auto nSum)
+                  {
+                      std::memcpy(&nSum, oRow.mpSums + nAt * sizeof nSum, sizeof nSum);
+                      return static_cast<SumOf<T>>(nSum);
+                  });
+    }
+    void Set(const SumRow& oRow, unsigned int nStage, std::size_t nAt, SumOf<T> nValue) const
+    {
+        As(nStage,
+           [&](auto nSum)
+           {
+               nSum = static_cast<decltype(nSum)>(nValue);
+               std::memcpy(oRow.mpSums + nAt * sizeof nSum, &nSum, sizeof nSum);
+           });
     }
 
-    template <typename Sum>
-    void Round(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, std::size_t nFirst, T* pPixels) const
-    {
-        const auto* const pSums = reinterpret_cast<const Sum*>(oSums.mpSums);
-        const bool bLastWhole = oBoxes.mnLastColumns == oBoxes.mnColumns;
-        const std::size_t nWhole = oBoxes.mnRows == oBoxes.mnColumns ? oBoxes.mnBoxes - (bLastWhole ? 0 : 1) : 0;
-        if (nFirst < nWhole)
-            RoundSums(pSums + nFirst * mnSamples, (nWhole - nFirst) * mnSamples, 2 * nStage,
-                      pPixels + nFirst * mnSamples);
-        for (std::size_t nBox = std::max(nFirst, nWhole); nBox < oBoxes.mnBoxes; ++nBox)
-            for (std::size_t n = nBox * mnSamples; n < (nBox + 1) * mnSamples; ++n)
-                pPixels[n] = MeanOf<T>(static_cast<SumOf<T>>(pSums[n]), oBoxes.GetSize(nBox));
-    }
-
+    krv::gobs::NativeDataTypeCode meType;
     unsigned int mnSamples;
 };
-#endif
 
-std::unique_ptr<IAverageSteps> MakeSteps(const SourceForm& oForm, [[maybe_unused]] unsigned int nStages,
-                                         bool bHalfValid)
+std::unique_ptr<IAverageSteps> MakeSteps(const SourceForm& oForm, bool bHalfValid)
 {
-#if defined(KRV_VECTOR_AVERAGES)
-    const unsigned int nSamples = oForm.GetSamples();
-    const bool bVectors = !oForm.mbValidity && (nSamples == 1 || nSamples == 3 || nSamples == 4) &&
-                          nStages <= VectorSteps<float, double, double>::MOST_STAGES;
+    const bool bVectors = !oForm.mbValidity && oForm.GetSamples() <= MOST_LOOP_SAMPLES;
     const auto eType = oForm.moType.GetNativeCode();
     if (bVectors && eType == krv::gobs::eDT_8U)
-        return std::make_unique<VectorSteps<std::uint8_t, std::uint16_t, std::uint32_t>>(oForm);
+        return std::make_unique<VectorSteps<std::uint8_t>>(oForm);
     if (bVectors && eType == krv::gobs::eDT_16U)
-        return std::make_unique<VectorSteps<std::uint16_t, std::uint32_t, std::uint32_t>>(oForm);
+        return std::make_unique<VectorSteps<std::uint16_t>>(oForm);
     if (bVectors && eType == krv::gobs::eDT_32R)
-        return std::make_unique<VectorSteps<float, double, double>>(oForm);
-#endif
+        return std::make_unique<VectorSteps<float>>(oForm);
     return ForSampleType(oForm.moType,
                          [&](auto nSample) -> std::unique_ptr<IAverageSteps>
                          { return std::make_unique<AnySteps<decltype(nSample)>>(oForm, bHalfValid); });
@@ -271,6 +266,7 @@ private:
         unsigned int mnWidth; // of the level
         unsigned int mnHeight;
         LevelTarget* mpoTarget = nullptr;
+        ReduceLoop mpLoop = nullptr;
         std::size_t mnSumBytes = 0; // of a pixel
         std::size_t mnCountBytes = 0;
         std::vector<unsigned char> moSums[2]; // of an even row and of an odd one
@@ -279,7 +275,14 @@ private:
 
     SumRow At(unsigned int nStage, unsigned int nX, unsigned int nY);
     SumRow Zeros() { return {moZeros.data(), mbCounts ? moZeros.data() : nullptr}; }
+    unsigned int GetBlockStages(std::size_t nPitch, unsigned int nRows) const;
+    void AddBlock(const SourceWindow& oWindow, unsigned int nY, unsigned int nPixels, unsigned int nRows,
+                  unsigned int nStages);
+    void AddRow(const SourceWindow& oWindow, unsigned int nX, unsigned int nY);
     void AddRows(const SumRow& oFirst, const SumRow& oSecond, unsigned int nX, unsigned int nY, unsigned int nPixels);
+    void GoOn(unsigned int nStage, unsigned int nX, unsigned int nY, unsigned int nPixels);
+    void MakeRow(unsigned int nStage, const SumRow& oFirst, const SumRow& oSecond, unsigned int nX, unsigned int nY,
+                 unsigned int nPixels);
     void PutRow(unsigned int nStage, const SumRow& oSums, unsigned int nX, unsigned int nY, unsigned int nPixels,
                 std::size_t nRounded, unsigned char* pPixels);
 
@@ -289,6 +292,7 @@ private:
     std::vector<Stage> moStages; // the image, then factors 2, 4, ...
     std::unique_ptr<IAverageSteps> mpoSteps;
     std::vector<unsigned char> moZeros;
+    std::vector<unsigned char> moBlock[2]; // sums of one stage of a block and of the next
     std::vector<unsigned char> moValid;
 };
 
@@ -302,12 +306,13 @@ AverageCascade::AverageCascade(const SourceForm& oForm, const std::vector<LevelT
         moStages.resize(std::max<std::size_t>(moStages.size(), nStage + 1));
         moStages[nStage].mpoTarget = oTask.mpoTarget;
     }
-    mpoSteps = MakeSteps(oForm, static_cast<unsigned int>(moStages.size()) - 1, bHalfValid);
+    mpoSteps = MakeSteps(oForm, bHalfValid);
     for (unsigned int nStage = 0; nStage < moStages.size(); ++nStage)
     {
         Stage& oStage = moStages[nStage];
         oStage.mnWidth = ((oForm.mnWidth - 1) >> nStage) + 1;
         oStage.mnHeight = ((oForm.mnHeight - 1) >> nStage) + 1;
+        oStage.mpLoop = nStage == 0 ? nullptr : mpoSteps->GetLoop(nStage);
         oStage.mnSumBytes = mpoSteps->GetSumBytes(nStage) * oForm.GetSamples();
         oStage.mnCountBytes = !mbCounts ? 0 : oForm.mnChannels * (nStage == 0 ? 1 : sizeof(std::uint32_t));
         const std::size_t nPixels = (oBounds.GetWidth() >> nStage) + 1;
@@ -328,66 +333,150 @@ SumRow AverageCascade::At(unsigned int nStage, unsigned int nX, unsigned int nY)
             mbCounts ? oStage.moCounts[nY % 2].data() + nPixel * oStage.mnCountBytes : nullptr};
 }
 
+// As much as whole blocks take goes block by block, the rest row by row; both leave the same rows waiting.
 void AverageCascade::Add(const SourceWindow& oWindow)
 {
     const PixelBounds& oBounds = oWindow.moBounds;
-    const Stage& oImage = moStages.front();
-    const std::size_t nPitch = oBounds.GetWidth() * oImage.mnSumBytes;
-    const std::size_t nCountPitch = oBounds.GetWidth() * oImage.mnCountBytes;
-    const auto Row = [&](unsigned int nY)
+    const std::size_t nPitch = oBounds.GetWidth() * moStages.front().mnSumBytes;
+    const unsigned int nStages = GetBlockStages(nPitch, oBounds.GetHeight());
+    const unsigned int nUnit = 1u << nStages;
+    const bool bAll = nStages + 1 == moStages.size();
+    const unsigned int nMostRows = bAll ? std::max(nUnit, static_cast<unsigned int>(BLOCK_BYTES / nPitch)) : nUnit;
+    // Where blocks do not take all columns, they end with a box of the last stage.
+    const unsigned int nColumns = oBounds.GetWidth() % nUnit == 0 ? nUnit : 1u << (moStages.size() - 1);
+    const unsigned int nWhole = nStages == 0 ? 0 : oBounds.GetWidth() / nColumns * nColumns;
+    for (unsigned int nY = oBounds.mnTop; nY < oBounds.mnBottom;)
     {
-        return SumRow{const_cast<unsigned char*>(oWindow.mpPixels) + (nY - oBounds.mnTop) * nPitch,
-                      mbCounts ? const_cast<unsigned char*>(oWindow.mpValid) + (nY - oBounds.mnTop) * nCountPitch
-                               : nullptr};
-    };
-    for (unsigned int nY = oBounds.mnTop; nY < oBounds.mnBottom; ++nY)
-    {
-        if (nPitch <= LONGEST_FETCHED_ROW)
-            Fetch(Row(nY).mpSums + FETCHED_AHEAD, nPitch);
-        const bool bLast = nY + 1 == oImage.mnHeight;
-        if (nY % 2 != 0)
-            AddRows(nY > oBounds.mnTop ? Row(nY - 1) : At(0, oBounds.mnLeft, nY - 1), Row(nY), oBounds.mnLeft, nY / 2,
-                    oBounds.GetWidth());
-        else if (bLast)
-            AddRows(Row(nY), Zeros(), oBounds.mnLeft, nY / 2, oBounds.GetWidth());
-        else if (nY + 1 == oBounds.mnBottom)
-        {
-            const SumRow oHeld = At(0, oBounds.mnLeft, nY);
-            std::memcpy(oHeld.mpSums, Row(nY).mpSums, nPitch);
-            if (mbCounts)
-                std::memcpy(oHeld.mpCounts, Row(nY).mpCounts, nCountPitch);
-        }
+        const unsigned int nRows = std::min(nMostRows, oBounds.mnBottom - nY) / nUnit * nUnit;
+        const bool bBlock = nWhole != 0 && nY % nUnit == 0 && nRows != 0;
+        if (bBlock)
+            AddBlock(oWindow, nY, nWhole, nRows, nStages);
+        const unsigned int nX = oBounds.mnLeft + (bBlock ? nWhole : 0);
+        for (const unsigned int nEnd = nY + (bBlock ? nRows : 1); nY < nEnd; ++nY)
+            if (nX < oBounds.mnRight)
+                AddRow(oWindow, nX, nY);
     }
 }
 
-// Two rows of the image make a row of the first stage; whenever a row has its
-// pair, or has none, the next stage goes on.
+// How many stages blocks of some of nRows rows of nPitch bytes go through at once.
+unsigned int AverageCascade::GetBlockStages(std::size_t nPitch, unsigned int nRows) const
+{
+    if (moStages.back().mpLoop == nullptr)
+        return 0;
+    unsigned int nStages = std::min(BLOCK_STAGES, static_cast<unsigned int>(moStages.size()) - 1);
+    while (nStages > 1 && (nPitch << nStages > BLOCK_BYTES || 1u << nStages > nRows))
+        --nStages;
+    return nStages;
+}
+
+// Rows from the left edge of a window on. The last one of nStages leaves a row of sums for the next; when there is
+// none, the rows may be more than those of one box.
+void AverageCascade::AddBlock(const SourceWindow& oWindow, unsigned int nY, unsigned int nPixels, unsigned int nRows,
+                              unsigned int nStages)
+{
+    const PixelBounds& oBounds = oWindow.moBounds;
+    unsigned int nX = oBounds.mnLeft;
+    ReduceJob oJob{};
+    const unsigned char* pSource = oWindow.mpPixels;
+    std::size_t nPitch = oBounds.GetWidth() * moStages.front().mnSumBytes;
+    pSource += (nY - oBounds.mnTop) * nPitch;
+    oJob.mbFetch = nPitch <= LONGEST_FETCHED_ROW;
+    for (unsigned int nStage = 1; nStage <= nStages; ++nStage)
+    {
+        const Stage& oStage = moStages[nStage];
+        nX /= 2;
+        nY /= 2;
+        nPixels /= 2;
+        nRows /= 2;
+        oJob.mpFirst = pSource;
+        oJob.mpSecond = pSource + nPitch;
+        oJob.mnPairPitch = 2 * nPitch;
+        oJob.mnWidth = nPixels;
+        oJob.mnHeight = nRows;
+        oJob.mnShift = 2 * nStage;
+        oJob.mnSumPitch = nPixels * oStage.mnSumBytes;
+        std::vector<unsigned char>& oSums = moBlock[nStage % 2];
+        if (nStage + 1 == moStages.size())
+            oJob.mpSums = nullptr;
+        else if (nStage == nStages)
+            oJob.mpSums = At(nStage, nX, nY).mpSums;
+        else
+        {
+            oSums.resize(std::max(oSums.size(), nRows * oJob.mnSumPitch));
+            oJob.mpSums = oSums.data();
+        }
+        oJob.mpMeans = oStage.mpoTarget != nullptr ? oStage.mpoTarget->Begin(nX, nY, nPixels, nRows) : nullptr;
+        oJob.mnMeanPitch = oStage.mpoTarget != nullptr ? oStage.mpoTarget->GetPitch() : 0;
+        oStage.mpLoop(oJob);
+        if (oStage.mpoTarget != nullptr)
+            oStage.mpoTarget->End(nullptr);
+        pSource = oJob.mpSums;
+        nPitch = oJob.mnSumPitch;
+    }
+    GoOn(nStages, nX, nY, nPixels);
+}
+
+// One row of the image from column nX on.
+void AverageCascade::AddRow(const SourceWindow& oWindow, unsigned int nX, unsigned int nY)
+{
+    const PixelBounds& oBounds = oWindow.moBounds;
+    const Stage& oImage = moStages.front();
+    const unsigned int nPixels = oBounds.mnRight - nX;
+    const auto Row = [&](unsigned int nRow)
+    {
+        const std::size_t nPixel = std::size_t{nRow - oBounds.mnTop} * oBounds.GetWidth() + (nX - oBounds.mnLeft);
+        return SumRow{const_cast<unsigned char*>(oWindow.mpPixels) + nPixel * oImage.mnSumBytes,
+                      mbCounts ? const_cast<unsigned char*>(oWindow.mpValid) + nPixel * oImage.mnCountBytes : nullptr};
+    };
+    if (nY % 2 != 0)
+        AddRows(nY > oBounds.mnTop ? Row(nY - 1) : At(0, nX, nY - 1), Row(nY), nX, nY / 2, nPixels);
+    else if (nY + 1 == oImage.mnHeight)
+        AddRows(Row(nY), Zeros(), nX, nY / 2, nPixels);
+    else if (nY + 1 == oBounds.mnBottom)
+    {
+        const SumRow oHeld = At(0, nX, nY);
+        std::memcpy(oHeld.mpSums, Row(nY).mpSums, nPixels * oImage.mnSumBytes);
+        if (mbCounts)
+            std::memcpy(oHeld.mpCounts, Row(nY).mpCounts, nPixels * oImage.mnCountBytes);
+    }
+}
+
+// Two rows of the image make a row of the first stage.
 void AverageCascade::AddRows(const SumRow& oFirst, const SumRow& oSecond, unsigned int nX, unsigned int nY,
                              unsigned int nPixels)
 {
-    SumRow oAbove = oFirst;
-    SumRow oBelow = oSecond;
-    for (unsigned int nStage = 1; nStage < moStages.size(); ++nStage)
+    MakeRow(1, oFirst, oSecond, nX / 2, nY, nPixels);
+    GoOn(1, nX / 2, nY, (nPixels + 1) / 2);
+}
+
+// Whenever a row of a stage has its pair, or has none, the next stage goes on.
+void AverageCascade::GoOn(unsigned int nStage, unsigned int nX, unsigned int nY, unsigned int nPixels)
+{
+    for (; nStage + 1 < moStages.size(); ++nStage)
     {
-        nX /= 2;
-        const SumRow oSums = At(nStage, nX, nY);
-        const Stage& oStage = moStages[nStage];
-        unsigned char* const pPixels =
-            oStage.mpoTarget != nullptr ? oStage.mpoTarget->Begin(nX, nY, (nPixels + 1) / 2) : nullptr;
-        const std::size_t nRounded = mpoSteps->Sum(nStage, oAbove, oBelow, nPixels, oSums, pPixels);
-        nPixels = (nPixels + 1) / 2;
-        const bool bDone = nRounded == nPixels && (std::uint64_t{nY} + 1) << nStage <= moForm.mnHeight;
-        if (pPixels != nullptr && bDone)
-            oStage.mpoTarget->End(nullptr);
-        else if (pPixels != nullptr)
-            PutRow(nStage, oSums, nX, nY, nPixels, nRounded, pPixels);
-        const bool bLast = nY + 1 == oStage.mnHeight;
+        const bool bLast = nY + 1 == moStages[nStage].mnHeight;
         if (nY % 2 == 0 && !bLast)
             return;
-        oAbove = At(nStage, nX, nY - nY % 2);
-        oBelow = nY % 2 != 0 ? oSums : Zeros();
+        const SumRow oAbove = At(nStage, nX, nY - nY % 2);
+        const SumRow oBelow = nY % 2 != 0 ? At(nStage, nX, nY) : Zeros();
+        nX /= 2;
         nY /= 2;
+        MakeRow(nStage + 1, oAbove, oBelow, nX, nY, nPixels);
+        nPixels = (nPixels + 1) / 2;
     }
+}
+
+// A row of a stage from two rows of nPixels pixels of the one below.
+void AverageCascade::MakeRow(unsigned int nStage, const SumRow& oFirst, const SumRow& oSecond, unsigned int nX,
+                             unsigned int nY, unsigned int nPixels)
+{
+    const Stage& oStage = moStages[nStage];
+    const SumRow oSums = At(nStage, nX, nY);
+    unsigned char* const pPixels =
+        oStage.mpoTarget != nullptr ? oStage.mpoTarget->Begin(nX, nY, (nPixels + 1) / 2) : nullptr;
+    const std::size_t nRounded = mpoSteps->Sum(nStage, oFirst, oSecond, nPixels, oSums, pPixels);
+    if (pPixels != nullptr)
+        PutRow(nStage, oSums, nX, nY, (nPixels + 1) / 2, nRounded, pPixels);
 }
 
 void AverageCascade::PutRow(unsigned int nStage, const SumRow& oSums, unsigned int nX, unsigned int nY,
@@ -400,7 +489,8 @@ void AverageCascade::PutRow(unsigned int nStage, const SumRow& oSums, unsigned i
                         bLastColumn ? moForm.mnWidth - (oStage.mnWidth - 1) * nFactor : nFactor};
     if (mbCounts)
         moValid.resize(std::max(moValid.size(), std::size_t{nPixels} * moForm.mnChannels));
-    const std::size_t nFirst = oBoxes.mnRows == nFactor ? nRounded : 0;
+    const std::size_t nWhole = oBoxes.mnLastColumns == nFactor ? nPixels : nPixels - 1;
+    const std::size_t nFirst = oBoxes.mnRows == nFactor ? std::min(nRounded, nWhole) : 0;
     if (nFirst < nPixels)
         mpoSteps->Finish(nStage, oSums, oBoxes, nFirst, pPixels, mbCounts ? moValid.data() : nullptr);
     oStage.mpoTarget->End(mbCounts ? moValid.data() : nullptr);

@@ -1,43 +1,44 @@
 #pragma once
 
-#include <cstddef>
-#include <cstdint>
+#include "gobs/raster/datatype.h"
 
-#if defined(__SSE4_1__)
-#define KRV_VECTOR_AVERAGES 1
-#endif
+#include <cstddef>
 
 namespace krv::datasources::detail
 {
 
-// Adds pixels up two by two and row by row: pixel i of the result is the sum of
-// the pixels 2i and 2i + 1 of two rows, for pixels of 1, 3 or 4 samples
-// (nSamples).
-#if defined(KRV_VECTOR_AVERAGES)
-void SumPairs(const std::uint16_t* pFirst, const std::uint16_t* pSecond, std::size_t nPairs, unsigned int nSamples,
-              std::uint16_t* pSums);
-void SumPairs(const std::uint16_t* pFirst, const std::uint16_t* pSecond, std::size_t nPairs, unsigned int nSamples,
-              std::uint32_t* pSums);
-void SumPairs(const std::uint32_t* pFirst, const std::uint32_t* pSecond, std::size_t nPairs, unsigned int nSamples,
-              std::uint32_t* pSums);
-void SumPairs(const float* pFirst, const float* pSecond, std::size_t nPairs, unsigned int nSamples, double* pSums);
-void SumPairs(const double* pFirst, const double* pSecond, std::size_t nPairs, unsigned int nSamples, double* pSums);
+// One step of a cascade over a block: pixel (x, y) of the result is the sum of the four pixels from (2x, 2y) on.
+// Pitches are bytes from one row to the next.
+struct ReduceJob
+{
+    const unsigned char* mpFirst; // a row of samples, or of sums of the step before, and the one below it
+    const unsigned char* mpSecond;
+    std::size_t mnPairPitch; // to the next two rows
+    std::size_t mnWidth;     // of the result, in pixels
+    std::size_t mnHeight;
+    unsigned char* mpSums; // null: not wanted
+    std::size_t mnSumPitch;
+    unsigned char* mpMeans; // the sums divided by 2 to the power of mnShift, half to even; null: not wanted
+    std::size_t mnMeanPitch;
+    unsigned int mnShift;
+    bool mbFetch; // samples are fetched ahead: rows follow each other in memory, and the processor does not see it
+};
 
-// The first step of the means of bytes, with the means of its own sums when
-// these are wanted: half to even.
-void SumAndRoundPairs(const std::uint8_t* pFirst, const std::uint8_t* pSecond, std::size_t nPairs,
-                      unsigned int nSamples, std::uint16_t* pSums, std::uint8_t* pMeans);
+constexpr unsigned int MOST_LOOP_SAMPLES = 4;
+using ReduceLoop = void (*)(const ReduceJob& oJob);
 
-// As much of it as wide vectors take, of nInput bytes in a row; gives how many sums that are. Only for processors that
-// have AVX2.
-std::size_t SumAndRoundByAvx2(const std::uint8_t* pFirst, const std::uint8_t* pSecond, std::size_t nInput,
-                              unsigned int nSamples, std::uint16_t* pSums, std::uint8_t* pMeans);
+// The loop for this processor: for pixels of 1 to MOST_LOOP_SAMPLES samples of 8U, 16U or 32R, from samples or sums of
+// nSourceBytes to sums of nSumBytes each. Unsigned integers add up in 2, 4 or 8 bytes, reals in doubles. Null for
+// anything else.
+ReduceLoop FindReduceLoop(krv::gobs::NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
+                          std::size_t nSumBytes);
 
-// Sums of 2 to the power of nShift samples each to their means, half to even.
-void RoundSums(const std::uint16_t* pSums, std::size_t nSums, unsigned int nShift, std::uint8_t* pMeans);
-void RoundSums(const std::uint32_t* pSums, std::size_t nSums, unsigned int nShift, std::uint8_t* pMeans);
-void RoundSums(const std::uint32_t* pSums, std::size_t nSums, unsigned int nShift, std::uint16_t* pMeans);
-void RoundSums(const double* pSums, std::size_t nSums, unsigned int nShift, float* pMeans);
-#endif
+// The same, compiled for one instruction set.
+ReduceLoop FindBaselineLoop(krv::gobs::NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
+                            std::size_t nSumBytes);
+ReduceLoop FindAvx2Loop(krv::gobs::NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
+                        std::size_t nSumBytes);
+ReduceLoop FindAvx512Loop(krv::gobs::NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
+                          std::size_t nSumBytes);
 
 } // namespace krv::datasources::detail

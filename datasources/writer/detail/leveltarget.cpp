@@ -46,12 +46,14 @@ PixelBounds TileGatherer::GetPart(unsigned int nColumn, unsigned int nRow) const
             static_cast<unsigned int>(nRight), static_cast<unsigned int>(nBottom)};
 }
 
-unsigned char* TileGatherer::FindTile(unsigned int nX, unsigned int nY, unsigned int nCount)
+unsigned char* TileGatherer::FindTile(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight)
 {
-    if (!moBounds.Contains(nX, nY) || !moBounds.Contains(nX + nCount - 1, nY))
+    const unsigned int nLastX = nX + nWidth - 1;
+    const unsigned int nLastY = nY + nHeight - 1;
+    if (!moBounds.Contains(nX, nY) || !moBounds.Contains(nLastX, nLastY))
         return nullptr;
     Tile& oTile = Get(nX, nY);
-    return oTile.moPart.Contains(nX + nCount - 1, nY) ? GetPlace(oTile, nX, nY) : nullptr;
+    return oTile.moPart.Contains(nLastX, nLastY) ? GetPlace(oTile, nX, nY) : nullptr;
 }
 
 void TileGatherer::StoreLast()
@@ -86,25 +88,27 @@ LevelTarget::LevelTarget(TileGatherer oPixels, const SourceForm& oForm, const IV
 
 unsigned char* LevelTarget::BeginApart()
 {
-    moRow.resize(std::max(moRow.size(), mnCount * mnPixelBytes));
-    return moRow.data();
+    moApart.resize(std::max(moApart.size(), std::size_t{mnWidth} * mnHeight * mnPixelBytes));
+    return moApart.data();
 }
 
-void LevelTarget::EndRow(const unsigned char* pValid)
+void LevelTarget::EndRows(const unsigned char* pValid)
 {
-    unsigned char* const pPixels = mpDirect != nullptr ? mpDirect : moRow.data();
+    const std::size_t nPixels = std::size_t{mnWidth} * mnHeight;
     if (pValid != nullptr)
-        mpoFinisher->Finish(pPixels, pValid, mnCount);
+        mpoFinisher->Finish(mpDirect != nullptr ? mpDirect : moApart.data(), pValid, nPixels);
     if (mpDirect != nullptr)
-        moPixels.Note(mnCount);
+        moPixels.Note(nPixels);
     else
-        moPixels.Put(mnX, mnY, mnCount, pPixels);
+        for (unsigned int n = 0; n < mnHeight; ++n)
+            moPixels.Put(mnX, mnY + n, mnWidth, moApart.data() + std::size_t{n} * mnWidth * mnPixelBytes);
     if (mpoMask == nullptr)
         return;
-    moMaskRow.assign(mnCount, static_cast<unsigned char>(pValid == nullptr));
-    for (std::size_t n = 0; pValid != nullptr && n < std::size_t{mnCount} * mnChannels; ++n)
+    moMaskRow.assign(mnWidth, static_cast<unsigned char>(pValid == nullptr));
+    for (std::size_t n = 0; pValid != nullptr && n < std::size_t{mnWidth} * mnChannels; ++n)
         moMaskRow[n / mnChannels] |= pValid[n];
-    mpoMask->Put(mnX, mnY, mnCount, moMaskRow.data());
+    for (unsigned int n = 0; n < mnHeight; ++n)
+        mpoMask->Put(mnX, mnY + n, mnWidth, moMaskRow.data());
 }
 
 } // namespace krv::datasources::detail

@@ -23,16 +23,18 @@ public:
     TileGatherer(const PixelBounds& oBounds, unsigned int nTileWidth, unsigned int nTileHeight, unsigned int nChannels,
                  const krv::gobs::DataType& oType, Store oStore);
 
-    // Memory for pixels of a row that lie in one tile and within the bounds; null
-    // for others.
-    unsigned char* Find(unsigned int nX, unsigned int nY, unsigned int nCount)
+    // Memory for a block of pixels that lie in one tile and within the bounds; null for others.
+    unsigned char* Find(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight)
     {
-        if (mpoLast != nullptr && mpoLast->moPart.Contains(nX, nY) && nX + nCount <= mpoLast->moPart.mnRight)
+        if (mpoLast != nullptr && mpoLast->moPart.Contains(nX, nY) &&
+            mpoLast->moPart.Contains(nX + nWidth - 1, nY + nHeight - 1))
             return GetPlace(*mpoLast, nX, nY);
-        return FindTile(nX, nY, nCount);
+        return FindTile(nX, nY, nWidth, nHeight);
     }
-    // As many pixels were written where Find said last.
-    void Note(unsigned int nCount)
+    // Bytes from row to row where Find said last.
+    std::size_t GetPitch() const { return mpoLast->moPart.GetWidth() * mnPixelBytes; }
+    // As many pixels were written there.
+    void Note(std::size_t nCount)
     {
         mpoLast->mnMissing -= nCount;
         if (mpoLast->mnMissing == 0)
@@ -56,7 +58,7 @@ private:
             std::size_t{nY - oTile.moPart.mnTop} * oTile.moPart.GetWidth() + (nX - oTile.moPart.mnLeft);
         return oTile.mpoRaster->GetBuffer() + nPixel * mnPixelBytes;
     }
-    unsigned char* FindTile(unsigned int nX, unsigned int nY, unsigned int nCount);
+    unsigned char* FindTile(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight);
     void StoreLast();
     PixelBounds GetPart(unsigned int nColumn, unsigned int nRow) const;
 
@@ -88,39 +90,42 @@ public:
     LevelTarget(TileGatherer oPixels, const SourceForm& oForm, const IValueFinisher* poFinisher);
     void SetMask(std::unique_ptr<TileGatherer> poMask) { mpoMask = std::move(poMask); }
 
-    // Memory for pixels of a row, which End takes. They may reach outside of what
-    // is to be made.
-    unsigned char* Begin(unsigned int nX, unsigned int nY, unsigned int nCount)
+    // Memory for pixels of a row, or of rows, which End takes. They may reach outside of what is to be made.
+    unsigned char* Begin(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight = 1)
     {
         mnX = nX;
         mnY = nY;
-        mnCount = nCount;
-        mpDirect = moPixels.Find(nX, nY, nCount);
+        mnWidth = nWidth;
+        mnHeight = nHeight;
+        mpDirect = moPixels.Find(nX, nY, nWidth, nHeight);
         return mpDirect != nullptr ? mpDirect : BeginApart();
     }
-    // pValid: a byte per value, or null when all are valid.
+    // Bytes from row to row of that memory.
+    std::size_t GetPitch() const { return mpDirect != nullptr ? moPixels.GetPitch() : mnWidth * mnPixelBytes; }
+    // pValid: a byte per value, or null when all are valid, as those of several rows must be.
     void End(const unsigned char* pValid)
     {
         if (mpDirect != nullptr && pValid == nullptr && mpoMask == nullptr)
-            moPixels.Note(mnCount);
+            moPixels.Note(std::size_t{mnWidth} * mnHeight);
         else
-            EndRow(pValid);
+            EndRows(pValid);
     }
 
 private:
     unsigned char* BeginApart();
-    void EndRow(const unsigned char* pValid);
+    void EndRows(const unsigned char* pValid);
 
     TileGatherer moPixels;
     std::unique_ptr<TileGatherer> mpoMask;
     const IValueFinisher* mpoFinisher; // borrowed
     unsigned int mnChannels;
     std::size_t mnPixelBytes;
-    std::vector<unsigned char> moRow;
+    std::vector<unsigned char> moApart;
     std::vector<unsigned char> moMaskRow;
     unsigned int mnX = 0;
     unsigned int mnY = 0;
-    unsigned int mnCount = 0;
+    unsigned int mnWidth = 0;
+    unsigned int mnHeight = 0;
     unsigned char* mpDirect = nullptr;
 };
 
