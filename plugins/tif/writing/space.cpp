@@ -7,6 +7,15 @@
 namespace krv::plugins::tif
 {
 
+namespace
+{
+
+// Whole pages of the system's cache are written and read faster where the cache has them too.
+constexpr std::uint64_t PAGE = 4096;
+constexpr std::uint64_t LARGE_PIECE = 32768;
+
+} // namespace
+
 Space::Space(const std::string& fileName, std::uint64_t nEnd, std::uint64_t nLimit)
     : moFileName(fileName), mnEnd(nEnd), mnForeignEnd(nEnd), mnLimit(nLimit)
 {
@@ -30,13 +39,17 @@ Extent Space::Allocate(std::uint64_t nBytes, std::uint64_t nReserve, const Place
             AddFree(nOffset + nTaken, nSize - nTaken);
         return {nOffset, nTaken, mnGeneration};
     }
-    const std::uint64_t nOffset = mnEnd + mnEnd % 2;
+    const bool bPages = nBytes >= LARGE_PIECE && nBytes % PAGE == 0;
+    const std::uint64_t nOffset = mnEnd + (bPages ? (PAGE - mnEnd % PAGE) % PAGE : mnEnd % 2);
     if (nTaken > mnLimit || nReserve > mnLimit - nTaken || nOffset > mnLimit - nTaken - nReserve)
         throw IOException(moFileName,
                           moFileName + ": the file would pass the limit of 4 GiB of classic TIFF; write it as BigTIFF "
                                        "(option BIGTIFF=YES)",
                           oPlace);
+    const std::uint64_t nGap = mnEnd + mnEnd % 2;
     mnEnd = nOffset + nTaken;
+    if (nGap < nOffset)
+        AddFree(nGap, nOffset - nGap);
     return {nOffset, nTaken, mnGeneration};
 }
 

@@ -31,8 +31,8 @@ public:
     // A piece before the end that is free from the start, for a new file that begins with a gap.
     void AddGap(std::uint64_t nOffset, std::uint64_t nBytes);
 
-    // A piece of nBytes, at an even offset. nReserve: bytes that must still fit in behind it. Throws IOException when
-    // the file would pass its limit.
+    // A piece of nBytes, at an even offset; a large one of whole pages, at the file's end, begins with one. nReserve:
+    // bytes that must still fit in behind it. Throws IOException when the file would pass its limit.
     Extent Allocate(std::uint64_t nBytes, std::uint64_t nReserve = 0, const Place& oPlace = Place::Current());
     // The first part of a fresh piece stays in use when nKept is above 0.
     void Release(const Extent& oExtent, std::uint64_t nKept = 0);
