@@ -87,9 +87,9 @@ unsigned long long GetTileOffset(const SceneFile& oScene, unsigned int nLevel, u
     return FIRST_TILE + (nTiles + 1ull * nRow * (oScene.mnSize / nLevel / TILE) + nColumn) * TILE_BYTES;
 }
 
-void BuildByHand(const SceneFile& oScene, const std::string& target, bool bSync)
+void BuildByHand(const SceneFile& oScene, const std::string& file, const std::string& target, bool bSync)
 {
-    TIFF* const poTiff = TIFFOpen(oScene.moPath.c_str(), "rm");
+    TIFF* const poTiff = TIFFOpen(file.c_str(), "rm");
     const int nFile = open(target.c_str(), O_RDWR | O_CREAT | O_TRUNC, 0644);
     if (poTiff == nullptr || nFile < 0)
         throw std::runtime_error("cannot open the files of the loop by hand");

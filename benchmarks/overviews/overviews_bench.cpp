@@ -45,12 +45,14 @@ namespace detail = krv::datasources::detail;
 
 const std::vector<unsigned int> LEVELS = {2, 4, 8, 16, 32};
 
-void Build(const std::string& file, bool bSync)
+// The writer, since one that goes without having been synchronised takes back what it wrote.
+std::unique_ptr<BasicWriter> Build(const std::string& file, bool bSync)
 {
-    BasicWriter oWriter(file);
-    krv::datasources::BuildOverviews(oWriter, LEVELS, "average");
+    auto oWriter = std::make_unique<BasicWriter>(file);
+    krv::datasources::BuildOverviews(*oWriter, LEVELS, "average");
     if (bSync)
-        oWriter.Synchronize();
+        oWriter->Synchronize();
+    return oWriter;
 }
 
 // The file without levels, in the page cache and not on its way to the disk.
@@ -70,7 +72,7 @@ void CheckEqual(const SceneFile& oScene, const std::string& folder)
     const std::string file = Copy(oScene, folder);
     const std::string target = folder + "/byhand.bin";
     Build(file, true);
-    BuildByHand(oScene, target, false);
+    BuildByHand(oScene, file, target, false);
     BasicWriter oWriter(file);
     const std::unique_ptr<krv::datasources::IOverviewReaderAccessor> oLevels(oWriter.GetOverviewReaderAccessor());
     const int nFile = open(target.c_str(), O_RDONLY);
@@ -92,10 +94,9 @@ void CheckEqual(const SceneFile& oScene, const std::string& folder)
 }
 
 #if defined(KRV_HAVE_VIPS)
-void SaveByVips(const SceneFile& oScene, const std::string& target, bool bPyramid)
+void SaveByVips(const std::string& file, const std::string& target, bool bPyramid)
 {
-    VipsImage* const poImage =
-        vips_image_new_from_file(oScene.moPath.c_str(), "access", VIPS_ACCESS_SEQUENTIAL, nullptr);
+    VipsImage* const poImage = vips_image_new_from_file(file.c_str(), "access", VIPS_ACCESS_SEQUENTIAL, nullptr);
     if (poImage == nullptr ||
         vips_tiffsave(poImage, target.c_str(), "tile", TRUE, "tile_width", 256, "tile_height", 256, "pyramid",
                       bPyramid ? TRUE : FALSE, "compression", VIPS_FOREIGN_TIFF_COMPRESSION_NONE, nullptr) != 0)
@@ -114,16 +115,17 @@ void MeasureFiles(const SceneFile& oScene, const std::string& folder, int nRound
         std::function<void()> moRun;
         std::vector<double> moTimes;
     };
+    std::unique_ptr<BasicWriter> oWriter;
     std::vector<Run> oRuns = {
-        {[&] { Build(file, false); }, {}},
-        {[&] { BuildByHand(oScene, target, false); }, {}},
-        {[&] { Build(file, true); }, {}},
-        {[&] { BuildByHand(oScene, target, true); }, {}},
+        {[&] { oWriter = Build(file, false); }, {}},
+        {[&] { BuildByHand(oScene, file, target, false); }, {}},
+        {[&] { oWriter = Build(file, true); }, {}},
+        {[&] { BuildByHand(oScene, file, target, true); }, {}},
     };
 #if defined(KRV_HAVE_VIPS)
     vips_concurrency_set(1);
-    oRuns.push_back({[&] { SaveByVips(oScene, folder + "/vips.tif", true); }, {}});
-    oRuns.push_back({[&] { SaveByVips(oScene, folder + "/vips.tif", false); }, {}});
+    oRuns.push_back({[&] { SaveByVips(file, folder + "/vips.tif", true); }, {}});
+    oRuns.push_back({[&] { SaveByVips(file, folder + "/vips.tif", false); }, {}});
 #endif
     std::vector<std::size_t> oOrder(oRuns.size());
     for (std::size_t n = 0; n < oOrder.size(); ++n)
@@ -134,6 +136,7 @@ void MeasureFiles(const SceneFile& oScene, const std::string& folder, int nRound
         std::shuffle(oOrder.begin(), oOrder.end(), oRandom);
         for (const std::size_t n : oOrder)
         {
+            oWriter.reset();
             std::filesystem::remove(target);
             std::filesystem::remove(folder + "/vips.tif");
             file = Copy(oScene, folder);
