@@ -1,5 +1,5 @@
 // krv_fuzz_seeds FOLDER: small TIFF files of every layout, byte order and compression, and of several types.
-#include "tests/conformance/tiffile.h"
+#include "tests/support/tiffwriter.h"
 
 #include <cstdio>
 #include <exception>
@@ -10,24 +10,34 @@ namespace
 
 void WriteSeeds(const std::filesystem::path& oFolder)
 {
-    const krv::gobs::NativeDataTypeCode TYPES[] = {krv::gobs::eDT_8U, krv::gobs::eDT_16U, krv::gobs::eDT_32R,
-                                                   krv::gobs::eDT_C16S};
-    const auto nVariants = static_cast<unsigned int>(krv::conformance::TifVariants().size());
-    for (unsigned int nVariant = 0; nVariant < nVariants; ++nVariant)
+    struct Sample
     {
-        for (const auto eType : TYPES)
-        {
-            krv::conformance::Image oImage;
-            oImage.mnWidth = 37;
-            oImage.mnHeight = 29;
-            oImage.moTypes = {eType, eType};
-            oImage.moTags = {{"SENSOR", "none"}, {"DefaultRed", "2"}};
-            oImage.moLevels = {2};
-            oImage.mnVariant = nVariant;
-            const std::string name = "seed_" + std::to_string(nVariant) + "_" + std::to_string(eType) + ".tif";
-            krv::conformance::WriteTifFile((oFolder / name).string(), oImage);
-        }
-    }
+        std::uint16_t mnBits;
+        std::uint16_t mnFormat;
+    };
+    constexpr Sample SAMPLES[] = {{8, 1}, {16, 1}, {32, 3}, {32, 5}};
+    constexpr std::uint16_t CODECS[] = {COMPRESSION_NONE, COMPRESSION_ADOBE_DEFLATE, COMPRESSION_LZW, COMPRESSION_ZSTD,
+                                        COMPRESSION_PACKBITS};
+    unsigned int nSeed = 0;
+    for (const Sample& oSample : SAMPLES)
+        for (const std::uint16_t nCodec : CODECS)
+            for (const char* pMode : {"wl", "wb8"})
+            {
+                const std::string name = "seed_" + std::to_string(++nSeed) + ".tif";
+                const auto oFile = krv::test::NewTiff((oFolder / name).string(), pMode);
+                krv::test::TiffForm oForm{37, 29, 2, oSample.mnBits, oSample.mnFormat, nCodec};
+                oForm.mbSeparate = nSeed % 3 == 0;
+                oForm.mnTileWidth = nSeed % 4 < 2 ? 0 : 16;
+                for (const std::uint32_t nReduced : {0, FILETYPE_REDUCEDIMAGE})
+                {
+                    SetForm(oFile.get(), oForm);
+                    TIFFSetField(oFile.get(), TIFFTAG_SUBFILETYPE, nReduced);
+                    krv::test::WriteBlocks(oFile.get());
+                    TIFFWriteDirectory(oFile.get());
+                    oForm.mnWidth = 19;
+                    oForm.mnHeight = 15;
+                }
+            }
 }
 
 } // namespace

@@ -1,6 +1,7 @@
 // Measures the block codecs on tiles of 256 x 256 in memory, one thread. Each decoding is compared with the image
 // first.
 
+#include "benchmarks/codec/memorytiff.h"
 #include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "plugins/support/codec/bits.h"
@@ -9,7 +10,6 @@
 #include "plugins/support/codec/lzwdecoder.h"
 #include "plugins/support/codec/predictor.h"
 #include "plugins/support/codec/zstddecoder.h"
-#include "tests/support/memorytiff.h"
 
 #include <array>
 #include <cmath>
@@ -23,10 +23,10 @@ namespace
 {
 
 using krv::benchmarks::MedianSeconds;
+using krv::benchmarks::MemoryTiff;
 using krv::benchmarks::Number;
 using krv::benchmarks::PrintHeading;
 using krv::benchmarks::PrintRow;
-using krv::test::MemoryTiff;
 namespace codec = krv::plugins::codec;
 using Bytes = std::vector<unsigned char>;
 

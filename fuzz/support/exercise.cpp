@@ -1,5 +1,6 @@
 #include "fuzz/support/exercise.h"
 
+#include "datasources/interfaces/datatypechannelfilter.h"
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
@@ -32,7 +33,7 @@ namespace
 
 using namespace krv::datasources;
 
-constexpr unsigned int MAX_CHANNELS = 4;
+constexpr std::size_t MAX_CHANNELS = 4;
 constexpr unsigned int MAX_TILE = 256;
 
 // One question; a refusal is as good an answer as any.
@@ -57,23 +58,11 @@ void ReadTiles(IRasterReader& oReader)
         Ask([&] { const std::unique_ptr<krv::gobs::Raster> oRaster(oReader.GetRaster(nTile)); });
 }
 
-// The first channels that have the type of channel nFirst.
-std::vector<unsigned int> ChannelsLike(const IRasterDataset& oRasters, unsigned int nFirst)
-{
-    const std::unique_ptr<IChannelInfo> oFirst(oRasters.GetChannelInfo(nFirst));
-    std::vector<unsigned int> oChannels;
-    for (unsigned int n = nFirst; n <= oRasters.GetChanCount() && oChannels.size() < MAX_CHANNELS; ++n)
-    {
-        const std::unique_ptr<IChannelInfo> oOther(oRasters.GetChannelInfo(n));
-        if (oOther->GetDataType() == oFirst->GetDataType())
-            oChannels.push_back(n);
-    }
-    return oChannels;
-}
-
 void ExerciseRasters(IDataset& oDataset, IRasterDataset& oRasters)
 {
-    const std::vector<unsigned int> oChannels = ChannelsLike(oRasters, 1);
+    const std::unique_ptr<IChannelInfo> oFirst(oRasters.GetChannelInfo(1));
+    std::vector<unsigned int> oChannels = DataTypeChannelFilter(oFirst->GetDataType()).Accept(oRasters);
+    oChannels.resize(std::min(oChannels.size(), MAX_CHANNELS));
     Ask(
         [&]
         {

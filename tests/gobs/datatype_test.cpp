@@ -2,7 +2,7 @@
 #include "gobs/raster/datatype.h"
 #include "gobs/raster/datatypeadapter.h"
 #include "gobs/raster/datatypeconstraints.h"
-#include "toolkit/exceptions/exceptions.h"
+#include "tests/support/thrown.h"
 
 #include <gtest/gtest.h>
 
@@ -79,19 +79,11 @@ TEST(DataTypeTest, AdapterKeepsItsGapsAndPlaces)
     }
     EXPECT_EQ(DataTypeAdapter::TypeToString(eDT_C16U), "C16U");
     EXPECT_THROW(DataTypeAdapter::TypeToString(eDT_BIT), ParameterException);
-    try
-    {
-        DataTypeAdapter::ByteSize(eDT_C16U);
-        FAIL() << "no exception";
-    }
-    catch (const ParameterException& oError)
-    {
-        EXPECT_STREQ(oError.what(), "Could not determine byte size for provided datatype");
-        EXPECT_EQ(oError.GetType(), 1);
-        EXPECT_EQ(oError.GetParameter(), "eDataType");
-        EXPECT_EQ(oError.GetSourceFile(), "gobs/raster/datatypeadapter");
-        EXPECT_EQ(oError.GetLine(), 86u);
-    }
+    const auto oError = test::Thrown<ParameterException>([] { DataTypeAdapter::ByteSize(eDT_C16U); });
+    EXPECT_STREQ(oError.what(), "Could not determine byte size for provided datatype");
+    EXPECT_EQ(oError.GetType(), 1);
+    EXPECT_EQ(oError.GetParameter(), "eDataType");
+    test::ExpectPlace(oError, "", "gobs/raster/datatypeadapter", 86);
 }
 
 TEST(DataTypeTest, BufferBytesCountEveryPartAndRefuseOverflow)

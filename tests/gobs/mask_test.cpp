@@ -1,7 +1,7 @@
 #include "gobs/mask/mask.h"
 #include "gobs/raster/raster.h"
+#include "tests/support/thrown.h"
 #include "toolkit/core/hmalloc.h"
-#include "toolkit/exceptions/exceptions.h"
 
 #include <gtest/gtest.h>
 
@@ -90,17 +90,9 @@ TEST(MaskTest, RetrieveRasterRefusesOtherRasters)
 {
     const Mask oMask(RasterInfo(4, 4, 1, DataType(eDT_8U)), RasterContext());
     Raster oReal(RasterInfo(4, 4, 2, DataType(eDT_32R)), RasterContext());
-    try
-    {
-        oMask.RetrieveRaster(oReal);
-        FAIL() << "no exception";
-    }
-    catch (const DataException& oError)
-    {
-        EXPECT_STREQ(oError.what(), "We can only rasterize into a eDT_BIT or eDT_8U Raster");
-        EXPECT_EQ(oError.GetSourceFile(), "gobs/mask/mask");
-        EXPECT_EQ(oError.GetLine(), 233u);
-    }
+    const auto oError = test::Thrown<DataException>([&] { oMask.RetrieveRaster(oReal); });
+    EXPECT_STREQ(oError.what(), "We can only rasterize into a eDT_BIT or eDT_8U Raster");
+    test::ExpectPlace(oError, "", "gobs/mask/mask", 233);
     Raster oTwo(RasterInfo(4, 4, 2, DataType(eDT_8U)), RasterContext());
     EXPECT_THROW(oMask.RetrieveRaster(oTwo), DataException);
     Raster oWider(RasterInfo(4, 4, 1, DataType(eDT_8U)), RasterContext(0, 0, 1, 0));

@@ -1,6 +1,6 @@
 #include "gobs/raster/raster.h"
+#include "tests/support/thrown.h"
 #include "toolkit/core/hmalloc.h"
-#include "toolkit/exceptions/exceptions.h"
 
 #include <gtest/gtest.h>
 
@@ -50,16 +50,8 @@ TEST(RasterTest, OwnershipFollowsTheFlag)
 
 TEST(RasterTest, NullBufferIsRefusedAtItsPlace)
 {
-    try
-    {
-        Raster oRaster(RasterInfo(1, 1, 1, DataType(eDT_8U)), RasterContext(), nullptr, true);
-        FAIL() << "no exception";
-    }
-    catch (const DataException& oError)
-    {
-        EXPECT_STREQ(oError.what(), "pBuffer is NULL, cannot create a Raster on NULL");
-        EXPECT_EQ(oError.GetSourceFile(), "gobs/raster/raster");
-        EXPECT_EQ(oError.GetLine(), 52u);
-        EXPECT_NE(oError.GetFunction().find("Raster::Raster("), std::string::npos) << oError.GetFunction();
-    }
+    const auto oError = test::Thrown<DataException>(
+        [] { Raster oRaster(RasterInfo(1, 1, 1, DataType(eDT_8U)), RasterContext(), nullptr, true); });
+    EXPECT_STREQ(oError.what(), "pBuffer is NULL, cannot create a Raster on NULL");
+    test::ExpectPlace(oError, "Raster::Raster(", "gobs/raster/raster", 52);
 }

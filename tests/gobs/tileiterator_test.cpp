@@ -1,5 +1,5 @@
 #include "gobs/tile/tileiterator.h"
-#include "toolkit/exceptions/exceptions.h"
+#include "tests/support/thrown.h"
 
 #include <gtest/gtest.h>
 
@@ -38,15 +38,8 @@ TEST(TileIteratorTest, OutsideTheGrid)
     EXPECT_EQ(oGrid.GetTileIndex(11, 0), 9u);
     EXPECT_EQ(oGrid.GetTileIndex(0, 7), 9u);
     EXPECT_EQ(oGrid.GetTileIndex(0xFFFFFFFFu, 0xFFFFFFFFu), 9u);
-    try
-    {
-        oGrid.GetTile(9);
-        FAIL() << "no exception";
-    }
-    catch (const OutOfBoundsException& oError)
-    {
-        EXPECT_EQ(oError.GetIndices(), std::vector<unsigned int>{9});
-    }
+    const auto oError = test::Thrown<OutOfBoundsException>([&] { oGrid.GetTile(9); });
+    EXPECT_EQ(oError.GetIndices(), std::vector<unsigned int>{9});
 }
 
 TEST(TileIteratorTest, ImagesWithoutPixelsHaveNoTiles)

@@ -22,8 +22,7 @@ void Append(std::string& oBytes, T nValue, std::size_t nBytes = sizeof(T))
     oBytes.append(reinterpret_cast<const char*>(&nValue), nBytes);
 }
 
-} // namespace
-
+// The bytes of one value in the machine's order.
 void AppendRecipeValue(std::string& oBytes, const krv::gobs::DataType& oType, unsigned int nChannel, unsigned int nX,
                        unsigned int nY)
 {
@@ -39,6 +38,8 @@ void AppendRecipeValue(std::string& oBytes, const krv::gobs::DataType& oType, un
             Append(oBytes, nReal);
     }
 }
+
+} // namespace
 
 std::string RecipeImage(unsigned int nWidth, unsigned int nHeight, const std::vector<unsigned int>& oChannels,
                         const krv::gobs::DataType& oType)

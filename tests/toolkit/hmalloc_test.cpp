@@ -4,11 +4,11 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <array>
 #include <atomic>
 #include <cstdint>
 #include <cstring>
 #include <memory>
-#include <mutex>
 #include <new>
 #include <random>
 #include <thread>
@@ -182,21 +182,14 @@ TEST(BlockPoolTest, ThreadsShareThePool)
     constexpr int THREADS = 4;
     constexpr int ROUNDS = 4000;
     TestPool oPool;
-    struct Handed
-    {
-        void* mpBlock;
-        std::size_t mnWords;
-        std::size_t mnMark;
-    };
-    std::mutex oMutex; // guards oBasket
-    std::vector<Handed> oBasket;
+    std::array<std::atomic<std::size_t*>, 12> oBasket{};
     std::atomic<int> nFaults{0};
-    const auto Release = [&](const Handed& oHanded)
+    // A block tells its length in its first word and a mark in the second, in the middle and at its end.
+    const auto Release = [&](std::size_t* pBlock)
     {
-        const auto* pWords = static_cast<const std::size_t*>(oHanded.mpBlock);
-        for (std::size_t nWord : {std::size_t(0), oHanded.mnWords / 2, oHanded.mnWords - 1})
-            nFaults += pWords[nWord] != oHanded.mnMark;
-        oPool->Free(oHanded.mpBlock);
+        if (pBlock != nullptr)
+            nFaults += pBlock[pBlock[0] / 2] != pBlock[1] || pBlock[pBlock[0] - 1] != pBlock[1];
+        oPool->Free(pBlock);
     };
     const auto Work = [&](unsigned int nThread)
     {
@@ -204,22 +197,11 @@ TEST(BlockPoolTest, ThreadsShareThePool)
         for (int nRound = 0; nRound < ROUNDS; ++nRound)
         {
             const std::size_t nWords = (24 * KIB + oRandom() % (200 * KIB)) / sizeof(std::size_t);
-            const std::size_t nMark = nThread * ROUNDS + static_cast<std::size_t>(nRound);
-            Handed oMine{oPool->Allocate(nWords * sizeof(std::size_t)), nWords, nMark};
-            for (std::size_t nWord : {std::size_t(0), nWords / 2, nWords - 1})
-                static_cast<std::size_t*>(oMine.mpBlock)[nWord] = nMark;
-            {
-                const std::lock_guard oLock(oMutex);
-                oBasket.push_back(oMine);
-                if (oBasket.size() > 12)
-                    std::swap(oMine, oBasket[oRandom() % oBasket.size()]);
-                else
-                    oMine.mpBlock = nullptr;
-                if (oMine.mpBlock != nullptr)
-                    oBasket.pop_back();
-            }
-            if (oMine.mpBlock != nullptr)
-                Release(oMine);
+            auto* const pBlock = static_cast<std::size_t*>(oPool->Allocate(nWords * sizeof(std::size_t)));
+            pBlock[0] = nWords;
+            for (const std::size_t nWord : {std::size_t(1), nWords / 2, nWords - 1})
+                pBlock[nWord] = nThread * ROUNDS + static_cast<std::size_t>(nRound);
+            Release(oBasket[oRandom() % oBasket.size()].exchange(pBlock));
             if (nRound % 500 == 499)
                 oPool->Trim();
         }
@@ -229,8 +211,8 @@ TEST(BlockPoolTest, ThreadsShareThePool)
         oThreads.emplace_back(Work, nThread);
     for (std::thread& oThread : oThreads)
         oThread.join();
-    for (const Handed& oHanded : oBasket)
-        Release(oHanded);
+    for (auto& oSlot : oBasket)
+        Release(oSlot);
     EXPECT_EQ(nFaults, 0);
     EXPECT_LE(oPool->GetKeptBytes(), oPool->GetPeakBytes());
     oPool->Trim();

@@ -1,4 +1,4 @@
-#include "toolkit/exceptions/exceptions.h"
+#include "tests/support/thrown.h"
 #include "toolkit/xml/limits.h"
 #include "toolkit/xml/xmldocument.h"
 #include "toolkit/xml/xmlerror.h"
@@ -59,15 +59,7 @@ std::string ParseFileError(const std::string& fileName)
 
 std::string ParseTreeError(const std::string& text)
 {
-    try
-    {
-        ParseTree(text.data(), text.size(), "tag 42112");
-    }
-    catch (const krv::DataException& oException)
-    {
-        return oException.what();
-    }
-    return "no exception";
+    return krv::test::Error([&] { ParseTree(text.data(), text.size(), "tag 42112"); });
 }
 
 Element Tree(const std::string& text)
@@ -125,20 +117,6 @@ TEST(XmlTranscode, ReplacesWhatIsNotValid)
     EXPECT_EQ(XmlTranscode(LONE), "\xEF\xBF\xBDx\xEF\xBF\xBD");
 }
 
-TEST(XmlDocument, AnswersXPathsAfterMoving)
-{
-    const krv::conformance::TempFolder oFolder;
-    const std::string file =
-        oFolder.Write("form\xC3\xA4t.xml", "<?xml version=\"1.0\"?>\n<Format><Object> tif </Object>"
-                                           "<Capabilities><Dataset><SupportsCreate/></Dataset>"
-                                           "</Capabilities></Format>");
-    krv::xml::Document oFirst = krv::xml::ParseFile(file);
-    const krv::xml::Document oDocument = std::move(oFirst);
-    EXPECT_EQ(Count(oDocument, "/Format/Capabilities/Dataset/SupportsCreate"), 1U);
-    EXPECT_EQ(Count(oDocument, "/Format/Capabilities/Dataset/SupportsMetadata"), 0U);
-    EXPECT_EQ(Count(oDocument, "/Format/Object/text()"), 1U);
-}
-
 TEST(XmlDocument, FailsWithTheParsersExceptionAndPrintsNothing)
 {
     const krv::conformance::TempFolder oFolder;
@@ -186,7 +164,7 @@ TEST(XmlDocument, ReadsNothingOutsideAndDefinesNoEntities)
         EXPECT_THAT(ParseFileError(oFolder.Write("x.xml", text)), HasSubstr("Document type declarations")) << text;
         EXPECT_THAT(ParseTreeError(text), HasSubstr("tag 42112: Document type declarations")) << text;
     }
-    EXPECT_EQ(ParseTreeError("<a>&undefined;</a>").find("tag 42112:1:"), 0U);
+    EXPECT_THAT(ParseTreeError("<a>&undefined;</a>"), ::testing::StartsWith("data: tag 42112:1:"));
 }
 
 TEST(XmlTree, KeepsNamesAttributesTextAndOrder)
@@ -242,7 +220,7 @@ TEST(XmlTree, RefusesWhatNobodyVouchesFor)
     for (std::size_t nAt = 0; nAt < krv::xml::MAX_DOCUMENT_NODES; ++nAt)
         many += "<b/>";
     EXPECT_THAT(ParseTreeError(many + "</a>"), HasSubstr("elements and attributes"));
-    EXPECT_EQ(ParseTreeError(NestedXml(krv::xml::MAX_DOCUMENT_DEPTH)), "no exception");
+    EXPECT_EQ(ParseTreeError(NestedXml(krv::xml::MAX_DOCUMENT_DEPTH)), "");
 }
 
 TEST(XmlTree, HonoursADeclaredEncoding)

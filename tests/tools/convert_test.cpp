@@ -10,9 +10,9 @@
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/multitypereader.h"
 #include "datasources/writer/basicwriter.h"
-#include "gobs/raster/raster.h"
 #include "tests/support/demofile.h"
 #include "tests/support/facts.h"
+#include "tests/support/pixels.h"
 #include "tests/tools/programrun.h"
 #include "tools/conformance/tempfolder.h"
 
@@ -35,8 +35,11 @@ using krv::datasources::BasicReader;
 using krv::datasources::DatasetManager;
 using krv::datasources::IDataset;
 using krv::test::DataFolder;
+using krv::test::ExpectFailure;
 using krv::test::Facts;
+using krv::test::PixelsOf;
 using krv::test::ProgramRun;
+using krv::test::ReadPixels;
 using krv::test::RunKrv;
 using nlohmann::json;
 
@@ -91,13 +94,6 @@ ProgramRun RunConvert(Texts oArguments)
 {
     oArguments.insert(oArguments.begin(), "convert");
     return RunKrv(oArguments);
-}
-
-void ExpectFailure(const ProgramRun& oRun, int nCode, const std::string& word)
-{
-    EXPECT_EQ(oRun.code, nCode) << oRun.errors;
-    EXPECT_EQ(std::count(oRun.errors.begin(), oRun.errors.end(), '\n'), 1) << oRun.errors;
-    EXPECT_NE(oRun.errors.find(word), std::string::npos) << word << " is not in: " << oRun.errors;
 }
 
 std::unique_ptr<IDataset> OpenFile(const std::string& file, AccessMode eMode = eUpdate)
@@ -161,10 +157,7 @@ TEST(Convert, RealFilesKeepTheirDisplayInASubset)
                                                                20 * oOld["geocoding"][nAxis + 2].get<double>());
     EXPECT_EQ(oInfo["crs"], oOld["crs"]);
     std::unique_ptr<krv::gobs::Raster> poPart(BasicReader(file, {3, 1, 4}).ReadRaster(10, 20, 100, 50));
-    std::unique_ptr<krv::gobs::Raster> poCopy(BasicReader(copy).ReadRaster(0, 0, 100, 50));
-    EXPECT_EQ(std::string(reinterpret_cast<char*>(poPart->GetBuffer()), poPart->GetBufferSize()),
-              std::string(reinterpret_cast<char*>(poCopy->GetBuffer()), poCopy->GetBufferSize()));
-
+    EXPECT_EQ(PixelsOf(*poPart), ReadPixels(BasicReader(copy)));
     const std::string table = oFolder.File("table.tif");
     ASSERT_EQ(RunConvert({DataFolder() + "/palette/lc.tif", table}).code, 0);
     {
@@ -196,23 +189,18 @@ TEST(Convert, StacksAndConvertsTypes)
     const std::string a = oFolder.File("a.dem"), b = oFolder.File("b.dem"), out = oFolder.File("out.tif");
     krv::test::WriteDemoFile(a, 70, 300, {eDT_8U, eDT_16S, eDT_8U}, {{"NO_DATA_VALUE", "-5"}});
     krv::test::WriteDemoFile(b, 70, 300, {eDT_32R, eDT_16S});
-    ExpectFailure(RunConvert({a, b, out}), 1, "8U and 16S");
+    ExpectFailure(RunConvert({a, b, out}), 1, {"8U and 16S"});
     EXPECT_FALSE(std::filesystem::exists(out));
 
     const auto oRun = RunConvert({a, b, out, "--type", "promoted", "--options", "BLOCKXSIZE=32 BLOCKYSIZE=32"});
     ASSERT_EQ(oRun.code, 0) << oRun.errors;
     EXPECT_EQ(oRun.errors, "");
     const auto poOut = OpenFile(out, eReadOnly);
-    const auto Read = [](krv::datasources::IRasterReader&& oReader)
-    {
-        const std::unique_ptr<Raster> poRaster(oReader.ReadRaster(0, 0, oReader.GetWidth(), oReader.GetHeight()));
-        return std::string(reinterpret_cast<char*>(poRaster->GetBuffer()), poRaster->GetBufferSize());
-    };
     using krv::datasources::MultiTypeReader;
-    EXPECT_EQ(Read(BasicReader(out, {1, 2, 3})),
-              Read(MultiTypeReader(a, {1, 2, 3}, DataType(eDT_32R), krv::datasources::eOwnPlace)));
-    EXPECT_EQ(Read(BasicReader(out, {4, 5})),
-              Read(MultiTypeReader(b, {1, 2}, DataType(eDT_32R), krv::datasources::eOwnPlace)));
+    EXPECT_EQ(ReadPixels(BasicReader(out, {1, 2, 3})),
+              ReadPixels(MultiTypeReader(a, {1, 2, 3}, DataType(eDT_32R), krv::datasources::eOwnPlace)));
+    EXPECT_EQ(ReadPixels(BasicReader(out, {4, 5})),
+              ReadPixels(MultiTypeReader(b, {1, 2}, DataType(eDT_32R), krv::datasources::eOwnPlace)));
     const auto oRecord = poOut->ReadAuxiliaryData();
     EXPECT_EQ(oRecord.GetFileMetadataValue("NO_DATA_VALUE"), "");
     EXPECT_EQ(oRecord.GetChanMetadataValue("NO_DATA_VALUE", 3), "-5");
@@ -222,7 +210,7 @@ TEST(Convert, StacksAndConvertsTypes)
     EXPECT_EQ(oLossy.code, 0);
     EXPECT_NE(oLossy.errors.find("type 8U cannot hold the no-data value -5"), std::string::npos) << oLossy.errors;
     EXPECT_NE(oLossy.errors.find("16S to 8U"), std::string::npos) << oLossy.errors;
-    EXPECT_EQ(Read(BasicReader(out)), Read(MultiTypeReader(a, {2}, DataType(eDT_8U))));
+    EXPECT_EQ(ReadPixels(BasicReader(out)), ReadPixels(MultiTypeReader(a, {2}, DataType(eDT_8U))));
 }
 
 TEST(Convert, ACloudOptimisedCopyHasItsLevels)
@@ -286,10 +274,9 @@ TEST(Convert, BitmapsAreCut)
     for (const unsigned int nBitmap : {1U, 2U})
     {
         BasicReader oReader(poCut, {nBitmap}, false);
-        const std::unique_ptr<krv::gobs::Raster> poRaster(oReader.ReadRaster(0, 0, 30, 10));
         std::string expected(300, '\0');
         expected[30 + nBitmap] = 1;
-        EXPECT_EQ(std::string(reinterpret_cast<char*>(poRaster->GetBuffer()), 300), expected);
+        EXPECT_EQ(ReadPixels(oReader), expected);
     }
 }
 
@@ -299,23 +286,24 @@ TEST(Convert, FailuresLeaveNothingBehindAndTheOldFileAsItWas)
     const std::string a = oFolder.File("a.dem"), b = oFolder.File("b.dem"), out = oFolder.Write("out.tif", "old");
     krv::test::WriteDemoFile(a, 50, 40, {krv::gobs::eDT_8U});
     krv::test::WriteDemoFile(b, 40, 50, {krv::gobs::eDT_8U});
-    ExpectFailure(RunConvert({a, oFolder.GetPath() + "/./a.dem"}), 2, "is the file itself");
-    ExpectFailure(RunConvert({a, b, out}), 1, "of one size");
-    ExpectFailure(RunConvert({a, out, "--window", "20,0,31,40"}), 2, "not inside the image of 50 x 40");
-    ExpectFailure(RunConvert({a, out, "--window", "1,2"}), 2, "x,y,width,height");
-    ExpectFailure(RunConvert({a, out, "--channels", "2"}), 2, "no channel 2");
-    ExpectFailure(RunConvert({a, out, "--type", "9U"}), 2, "9U");
-    ExpectFailure(RunConvert({a, out, "--format", "NONE"}), 2, "NONE");
-    ExpectFailure(RunConvert({a, out, "--options", "COMPRESS=MAGIC"}), 2, "COMPRESS=MAGIC");
-    ExpectFailure(RunConvert({a, out, "--options", "PREDICTOR=3 COMPRESS=LZW"}), 2, "8U");
-    ExpectFailure(RunConvert({a, out, "--window", "0,0,99999999999,5"}), 2, "above 4294967295");
-    ExpectFailure(RunConvert({a, out, "--channels", ""}), 2, "--channels: the value is empty");
-    ExpectFailure(RunConvert({a, oFolder.File("out.png")}), 2, "extension .png");
-    ExpectFailure(RunConvert({a, oFolder.GetPath() + "/none/out.tif"}), 1, "there is no folder " + oFolder.GetPath());
-    ExpectFailure(RunConvert({a, oFolder.GetPath()}), 1, "no plain file");
+    krv::test::ExpectRefusals("convert",
+                              {{{a, oFolder.GetPath() + "/./a.dem"}, 2, "is the file itself"},
+                               {{a, b, out}, 1, "of one size"},
+                               {{a, out, "--window", "20,0,31,40"}, 2, "not inside the image of 50 x 40"},
+                               {{a, out, "--window", "1,2"}, 2, "x,y,width,height"},
+                               {{a, out, "--channels", "2"}, 2, "no channel 2"},
+                               {{a, out, "--type", "9U"}, 2, "9U"},
+                               {{a, out, "--format", "NONE"}, 2, "NONE"},
+                               {{a, out, "--options", "COMPRESS=MAGIC"}, 2, "COMPRESS=MAGIC"},
+                               {{a, out, "--options", "PREDICTOR=3 COMPRESS=LZW"}, 2, "8U"},
+                               {{a, out, "--window", "0,0,99999999999,5"}, 2, "above 4294967295"},
+                               {{a, out, "--channels", ""}, 2, "--channels: the value is empty"},
+                               {{a, oFolder.File("out.png")}, 2, "extension .png"},
+                               {{a, oFolder.GetPath() + "/none/out.tif"}, 1, "there is no folder " + oFolder.GetPath()},
+                               {{a, oFolder.GetPath()}, 1, "no plain file"}});
     // A file that ends in the middle of its pixels fails on the way.
     std::filesystem::resize_file(a, std::filesystem::file_size(a) - 900);
-    ExpectFailure(RunConvert({a, out}), 1, "a.dem");
+    ExpectFailure(RunConvert({a, out}), 1, {"a.dem"});
     EXPECT_EQ(krv::conformance::ReadFile(out), "old");
 
     const std::string large = oFolder.File("large.dem");
@@ -326,7 +314,7 @@ TEST(Convert, FailuresLeaveNothingBehindAndTheOldFileAsItWas)
     std::filesystem::resize_file(large, bytes.size() + std::uint64_t{9000} * 9000 * 8);
     const auto oStopped =
         krv::test::RunProgram(KRV_PROGRAM, {"convert", large, out, "--options", "COMPRESS=DEFLATE LEVEL=9"}, {}, 300);
-    ExpectFailure(oStopped, 1, "stopped");
+    ExpectFailure(oStopped, 1, {"stopped"});
     EXPECT_EQ(krv::conformance::ReadFile(out), "old");
     EXPECT_EQ(std::distance(std::filesystem::directory_iterator(oFolder.GetPath()), {}), 4);
 }

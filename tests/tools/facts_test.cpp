@@ -1,16 +1,28 @@
-// Compares what the command says with a table of facts about real files, when the folder with both is there.
+// Compares what the command says and the library reads with a table of facts about real files, when the folder with
+// both is there.
 
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/ichannelinfo.h"
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/ioverviewmanager.h"
+#include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/irasterio.h"
+#include "datasources/iomanager/datasetmanager.h"
 #include "datasources/reader/basicreader.h"
-#include "datasources/reader/rasterrange.h"
+#include "gobs/pct/pct.h"
+#include "gobs/raster/raster.h"
 #include "tests/support/facts.h"
 #include "tests/tools/programrun.h"
 
 #include <gtest/gtest.h>
 #include <zlib.h>
 
+#include <algorithm>
 #include <cmath>
+#include <cstring>
 #include <filesystem>
 #include <map>
+#include <sstream>
 
 namespace krv::tool
 {
@@ -18,12 +30,14 @@ namespace krv::tool
 namespace
 {
 
+using krv::datasources::BasicReader;
 using krv::test::DataFolder;
 using krv::test::Facts;
 using krv::test::RunKrv;
 using krv::test::Split;
 using krv::test::ToHalf;
 using nlohmann::json;
+using Colour = krv::gobs::RGBTuple<std::uint16_t>;
 
 std::string ExpectedType(const std::string& type)
 {
@@ -38,22 +52,98 @@ std::string ExpectedType(const std::string& type)
     return TYPES.at(type);
 }
 
-std::string HalfChecksum(const std::string& file, unsigned int nChannel)
+std::string Crc(const std::string& bytes)
 {
-    krv::datasources::BasicReader oReader(file, {nChannel});
-    oReader.SetTileSize(oReader.GetWidth(), 16);
-    uLong nSum = 0;
-    for (const auto poTile : krv::datasources::RasterRange(oReader))
-    {
-        std::vector<std::uint16_t> oHalves;
-        const auto* const pValues = reinterpret_cast<const float*>(poTile->GetBuffer());
-        for (std::uint64_t i = 0; i < poTile->GetBufferSize() / 4; ++i)
-            oHalves.push_back(ToHalf(pValues[i]));
-        nSum = crc32(nSum, reinterpret_cast<const Bytef*>(oHalves.data()), static_cast<uInt>(2 * oHalves.size()));
-    }
     std::array<char, 9> aText{};
-    std::snprintf(aText.data(), aText.size(), "%08lx", nSum);
+    std::snprintf(aText.data(), aText.size(), "%08lx",
+                  crc32_z(0, reinterpret_cast<const Bytef*>(bytes.data()), bytes.size()));
     return aText.data();
+}
+
+// The checksum of a channel; halves are narrowed back.
+std::string ChannelChecksum(const krv::gobs::Raster& oRaster, unsigned int nPosition, bool bHalf)
+{
+    const std::size_t nValueBytes = oRaster.GetDataType().GetValueBits() / 8;
+    std::string bytes;
+    for (std::uint64_t nPixel = 0; nPixel < oRaster.GetFullWidth() * oRaster.GetFullHeight(); ++nPixel)
+    {
+        const auto* const pValue = reinterpret_cast<const char*>(
+            oRaster.GetBuffer() + (nPixel * oRaster.GetChansCount() + nPosition) * nValueBytes);
+        float nValue = 0;
+        if (bHalf)
+            std::memcpy(&nValue, pValue, sizeof nValue);
+        const std::uint16_t nHalf = ToHalf(nValue);
+        bytes.append(bHalf ? reinterpret_cast<const char*>(&nHalf) : pValue, bHalf ? 2 : nValueBytes);
+    }
+    return Crc(bytes);
+}
+
+void CompareWindow(const Facts& oFacts, const std::string& file)
+{
+    BasicReader oReader(file);
+    EXPECT_EQ(std::to_string(oReader.GetChannelsInfo()[0]->GetNativeDataType().GetValueBits()), oFacts["bits"]);
+    if (oFacts["layout"] == "tiles")
+    {
+        EXPECT_EQ(std::to_string(oReader.GetTileWidth()) + "x" + std::to_string(oReader.GetTileHeight()),
+                  oFacts["block"]);
+    }
+    std::istringstream oWindow(oFacts["window"]);
+    unsigned int nX = 0, nY = 0, nWidth = 0, nHeight = 0;
+    oWindow >> nX >> nY >> nWidth >> nHeight;
+    const std::unique_ptr<krv::gobs::Raster> poPart(oReader.ReadRaster(nX, nY, nWidth, nHeight));
+    std::string sums;
+    for (unsigned int nPosition = 0; nPosition < oReader.GetChansCount(); ++nPosition)
+        sums += (nPosition == 0 ? "" : ";") + ChannelChecksum(*poPart, nPosition, oFacts.IsHalf());
+    EXPECT_TRUE(oFacts.IsLossy() || sums == oFacts["window_crc32"]) << sums;
+}
+
+// The table has masks of bytes as they stand and of bits as 0 and 255.
+void CompareMask(krv::datasources::IRasterIO& oIO, const std::string& fact)
+{
+    EXPECT_EQ(std::to_string(oIO.GetFileWidth()) + "x" + std::to_string(oIO.GetFileHeight()),
+              fact.substr(0, fact.rfind('x')));
+    std::string bytes(std::size_t{oIO.GetFileWidth()} * oIO.GetFileHeight(), '?');
+    oIO.ReadWindow(0u, 0u, oIO.GetFileWidth(), oIO.GetFileHeight(), reinterpret_cast<unsigned char*>(bytes.data()));
+    const std::string plain = Crc(bytes);
+    std::replace(bytes.begin(), bytes.end(), '\1', '\xff');
+    const std::string crc = fact.substr(fact.find(':') + 1);
+    EXPECT_TRUE(crc == plain || crc == Crc(bytes)) << crc;
+}
+
+void CompareMasks(const Facts& oFacts, krv::datasources::IBitmapDataset& oDataset)
+{
+    const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(oDataset.GetBitmapOverviewManager());
+    const auto oNumbers = poLevels != nullptr ? poLevels->GetLevels() : std::vector<unsigned int>();
+    const auto oBitmaps = oDataset.GetBitmapList();
+    std::size_t nMasks = 0, nLevels = 0;
+    for (const std::string& fact : oFacts.List("masks", ' '))
+    {
+        const bool bFull = fact.starts_with(oFacts["width"] + "x");
+        ASSERT_LT(bFull ? nMasks : nLevels, bFull ? oBitmaps.size() : oNumbers.size());
+        const std::unique_ptr<krv::datasources::IRasterIO> poIO(
+            bFull ? oDataset.GetBitmapIO({oBitmaps[nMasks++]}) : poLevels->GetOverviewIO(oNumbers[nLevels++], {1}));
+        CompareMask(*poIO, fact);
+    }
+    EXPECT_EQ(nMasks, oBitmaps.size());
+    EXPECT_EQ(nLevels, oNumbers.size());
+}
+
+void ComparePalette(const Facts& oFacts, krv::datasources::IPCTDataset& oDataset)
+{
+    ASSERT_EQ(oDataset.GetPCTList().empty(), !oFacts.Has("palette"));
+    if (!oFacts.Has("palette"))
+        return;
+    const std::unique_ptr<krv::gobs::PCT> poTable(oDataset.GetPCT(1));
+    std::string exact, narrow;
+    for (const auto pPart : {&Colour::red, &Colour::green, &Colour::blue})
+        for (const krv::gobs::PCT::Entry& oEntry : poTable->GetEntries())
+            for (const int nShift : {0, 8})
+            {
+                exact += static_cast<char>(oEntry.colour.*pPart >> nShift);
+                narrow += static_cast<char>(oEntry.colour.*pPart / 257 >> nShift);
+            }
+    const std::string count = std::to_string(poTable->GetEntries().size()) + ":";
+    EXPECT_TRUE(count + Crc(exact) == oFacts["palette"] || count + Crc(narrow) == oFacts["palette"]);
 }
 
 void CompareGeography(const Facts& oFacts, const json& oInfo)
@@ -130,12 +220,6 @@ void CompareInfo(const Facts& oFacts, const std::string& file)
     }
     CompareGeography(oFacts, oInfo);
     CompareLevels(oFacts, oInfo, file);
-    const std::string full = oFacts["width"] + "x" + oFacts["height"] + "x";
-    std::size_t nMasks = 0;
-    for (const std::string& page : oFacts.List("masks", ' '))
-        nMasks += page.starts_with(full) ? 1 : 0;
-    EXPECT_EQ(oInfo["bitmaps"].size(), nMasks);
-    EXPECT_EQ(oInfo["colourTables"].size(), oFacts.Has("palette") ? 1U : 0U);
 }
 
 void CompareChecksums(const Facts& oFacts, const std::string& file)
@@ -147,8 +231,11 @@ void CompareChecksums(const Facts& oFacts, const std::string& file)
     ASSERT_EQ(oSums["channels"].size(), oExpected.size());
     for (std::size_t c = 0; c < oExpected.size() && !oFacts.IsLossy(); ++c)
     {
-        const std::string found = oFacts.IsHalf() ? HalfChecksum(file, static_cast<unsigned int>(c) + 1)
-                                                  : oSums["channels"][c]["crc32"].get<std::string>();
+        BasicReader oReader(file, {static_cast<unsigned int>(c) + 1});
+        const std::unique_ptr<krv::gobs::Raster> poWhole(
+            oFacts.IsHalf() ? oReader.ReadRaster(0, 0, oReader.GetWidth(), oReader.GetHeight()) : nullptr);
+        const std::string found =
+            oFacts.IsHalf() ? ChannelChecksum(*poWhole, 0, true) : oSums["channels"][c]["crc32"].get<std::string>();
         EXPECT_EQ(found, oExpected[c]) << "channel " << c + 1;
     }
 }
@@ -177,6 +264,8 @@ void CompareStatistics(const Facts& oFacts, const std::string& file)
         if (!oNoData.empty() && !oFacts.IsLossy())
         {
             EXPECT_EQ(oChannel["noData"].dump(), oNoData.at(c));
+            const auto oMask = RunKrv({"mask", file, "--no-data", "--channels", std::to_string(c + 1), "--json"});
+            EXPECT_TRUE(!oFacts.Has("no_data") || oMask.Json()["set"].dump() == oNoData.at(c)) << oMask.errors;
         }
         if (oFacts["no_data"] != "nan" && oFacts["type"] != "cint16")
         {
@@ -202,6 +291,11 @@ TEST(RealFiles, AgreeWithTheTableOfFacts)
         CompareInfo(oFacts, file);
         CompareChecksums(oFacts, file);
         CompareStatistics(oFacts, file);
+        CompareWindow(oFacts, file);
+        const std::unique_ptr<krv::datasources::IDataset> poDataset(
+            krv::datasources::DatasetManager::GetInstance()->Open(file, eReadOnly));
+        CompareMasks(oFacts, dynamic_cast<krv::datasources::IBitmapDataset&>(*poDataset));
+        ComparePalette(oFacts, dynamic_cast<krv::datasources::IPCTDataset&>(*poDataset));
     }
 }
 

@@ -1,13 +1,10 @@
 // krv overviews as users run it.
 
+#include "tests/support/tiffwriter.h"
 #include "tests/tools/programrun.h"
 #include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
-#include <tiffio.h>
-
-#include <algorithm>
-#include <memory>
 
 namespace krv::tool
 {
@@ -25,12 +22,10 @@ using krv::test::RunProgram;
 std::string MakeFile(const TempFolder& oFolder, unsigned int nSize, bool bTable)
 {
     const std::string file = oFolder.File("image.tif");
-    const std::unique_ptr<TIFF, decltype(&TIFFClose)> oTiff(TIFFOpen(file.c_str(), "w"), &TIFFClose);
-    TIFFSetField(oTiff.get(), TIFFTAG_IMAGEWIDTH, nSize);
-    TIFFSetField(oTiff.get(), TIFFTAG_IMAGELENGTH, nSize);
-    TIFFSetField(oTiff.get(), TIFFTAG_BITSPERSAMPLE, 8);
-    TIFFSetField(oTiff.get(), TIFFTAG_ROWSPERSTRIP, 16);
-    TIFFSetField(oTiff.get(), TIFFTAG_PHOTOMETRIC, bTable ? PHOTOMETRIC_PALETTE : PHOTOMETRIC_MINISBLACK);
+    const krv::test::TiffFile oTiff = krv::test::NewTiff(file);
+    krv::test::SetForm(oTiff.get(), {nSize, nSize});
+    if (bTable)
+        TIFFSetField(oTiff.get(), TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_PALETTE);
     std::vector<unsigned short> oColours(256);
     if (bTable)
         TIFFSetField(oTiff.get(), TIFFTAG_COLORMAP, oColours.data(), oColours.data(), oColours.data());
@@ -56,7 +51,7 @@ TEST(OverviewsVerb, LevelsAreThereForLibtiffToo)
     EXPECT_EQ(RunKrv({"overviews", file, "--levels", "3", "--resampling", "Lanczos"}).code, 0);
     EXPECT_EQ(RunKrv({"info", file, "--json"}).Json()["overviews"].size(), 3u);
 
-    const std::unique_ptr<TIFF, decltype(&TIFFClose)> oTiff(TIFFOpen(file.c_str(), "r"), &TIFFClose);
+    const krv::test::TiffFile oTiff(TIFFOpen(file.c_str(), "r"));
     ASSERT_EQ(TIFFSetDirectory(oTiff.get(), 1), 1);
     unsigned int nKind = 0;
     TIFFGetField(oTiff.get(), TIFFTAG_SUBFILETYPE, &nKind);
@@ -72,27 +67,14 @@ TEST(OverviewsVerb, RefusalsLeaveTheFileAsItIs)
     const TempFolder oFolder;
     const std::string file = MakeFile(oFolder, 300, true);
     const std::string before = ReadFile(file);
-    const struct
-    {
-        std::vector<std::string> moArguments;
-        int mnCode;
-        const char* mpWord;
-    } CASES[] = {
-        {{"overviews", file, "--resampling", "average"}, 2, "colour table"},
-        {{"overviews", file, "--resampling", "best"}, 2, "best"},
-        {{"overviews", file, "--levels", "2,x"}, 2, "--levels"},
-        {{"overviews", file, "--levels", "1"}, 2, "factors from 2"},
-        {{"overviews", file, "--changed", "300,0,9,9"}, 2, "no pixel of the image"},
-        {{"overviews", file, "--levels", "2,4096"}, 2, "from 2 to 512"},
-        {{"overviews", file, "--changed", "1,2"}, 2, "--changed"},
-        {{"overviews", oFolder.File("none.tif")}, 1, "no such file"},
-    };
-    for (const auto& oCase : CASES)
-    {
-        const ProgramRun oRun = RunKrv(oCase.moArguments);
-        EXPECT_EQ(oRun.code, oCase.mnCode) << oRun.errors;
-        EXPECT_NE(oRun.errors.find(oCase.mpWord), std::string::npos) << oRun.errors;
-    }
+    krv::test::ExpectRefusals("overviews", {{{file, "--resampling", "average"}, 2, "colour table"},
+                                            {{file, "--resampling", "best"}, 2, "best"},
+                                            {{file, "--levels", "2,x"}, 2, "--levels"},
+                                            {{file, "--levels", "1"}, 2, "factors from 2"},
+                                            {{file, "--changed", "300,0,9,9"}, 2, "no pixel of the image"},
+                                            {{file, "--levels", "2,4096"}, 2, "from 2 to 512"},
+                                            {{file, "--changed", "1,2"}, 2, "--changed"},
+                                            {{oFolder.File("none.tif")}, 1, "no such file"}});
     EXPECT_EQ(ReadFile(file), before);
     EXPECT_EQ(RunKrv({"overviews", file}).code, 0); // by mode, without being told
 }

@@ -2,13 +2,13 @@
 
 #include "tests/support/demofile.h"
 #include "tests/support/recipe.h"
+#include "tests/support/tiffwriter.h"
 #include "tests/tools/programrun.h"
 #include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
 #include <png.h>
 #include <sys/stat.h>
-#include <tiffio.h>
 #include <zlib.h>
 
 #include <algorithm>
@@ -22,6 +22,7 @@ namespace
 {
 
 using krv::conformance::TempFolder;
+using krv::test::ExpectFailure;
 using krv::test::ProgramRun;
 using krv::test::RunKrv;
 using krv::test::RunProgram;
@@ -41,16 +42,6 @@ std::string Hexadecimal(unsigned long nNumber)
     std::array<char, 9> aText{};
     std::snprintf(aText.data(), aText.size(), "%08lx", nNumber);
     return aText.data();
-}
-
-// Failed, and said so on one line that holds all the words.
-void ExpectFailure(const ProgramRun& oRun, int nCode, const std::vector<std::string>& oWords)
-{
-    EXPECT_EQ(oRun.code, nCode) << oRun.errors;
-    EXPECT_EQ(std::count(oRun.errors.begin(), oRun.errors.end(), '\n'), 1) << oRun.errors;
-    EXPECT_TRUE(oRun.output.empty()) << oRun.output;
-    for (const std::string& word : oWords)
-        EXPECT_NE(oRun.errors.find(word), std::string::npos) << word << " is not in: " << oRun.errors;
 }
 
 TEST(Command, FormatsListsWhatIsInstalled)
@@ -225,18 +216,10 @@ TEST(Command, BrokenInstallationsAreDiagnosed)
 // A tiled file of zeros; its blocks but the first are not stored.
 void WriteSparse(const std::string& file, unsigned int nSize, const char* pDescription)
 {
-    TIFF* const poTiff = TIFFOpen(file.c_str(), "w8");
-    TIFFSetField(poTiff, TIFFTAG_IMAGEWIDTH, nSize);
-    TIFFSetField(poTiff, TIFFTAG_IMAGELENGTH, nSize);
-    TIFFSetField(poTiff, TIFFTAG_BITSPERSAMPLE, 8);
-    TIFFSetField(poTiff, TIFFTAG_SAMPLESPERPIXEL, 1);
-    TIFFSetField(poTiff, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
-    TIFFSetField(poTiff, TIFFTAG_TILEWIDTH, 512);
-    TIFFSetField(poTiff, TIFFTAG_TILELENGTH, 512);
-    TIFFSetField(poTiff, TIFFTAG_IMAGEDESCRIPTION, pDescription);
-    std::string tile(512 * 512, '\0');
-    TIFFWriteEncodedTile(poTiff, 0, tile.data(), static_cast<tmsize_t>(tile.size()));
-    TIFFClose(poTiff);
+    const krv::test::TiffFile poTiff = krv::test::NewTiff(file, "w8");
+    krv::test::SetForm(poTiff.get(), {.mnWidth = nSize, .mnHeight = nSize, .mnRows = 512, .mnTileWidth = 512});
+    TIFFSetField(poTiff.get(), TIFFTAG_IMAGEDESCRIPTION, pDescription);
+    krv::test::WriteBlock(poTiff.get(), 0, std::vector<unsigned char>(512 * 512));
 }
 
 TEST(Command, ForeignBytesInMetadataKeepTheJsonValid)

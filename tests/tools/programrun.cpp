@@ -2,11 +2,14 @@
 
 #include "tools/conformance/tempfolder.h"
 
+#include <gtest/gtest.h>
+
 #include <fcntl.h>
 #include <spawn.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <chrono>
 #include <csignal>
 #include <stdexcept>
@@ -67,6 +70,25 @@ ProgramRun RunProgram(const std::string& program, const std::vector<std::string>
 ProgramRun RunKrv(const std::vector<std::string>& oArguments, const std::vector<std::string>& oEnvironment)
 {
     return RunProgram(KRV_PROGRAM, oArguments, oEnvironment);
+}
+
+void ExpectFailure(const ProgramRun& oRun, int nCode, const std::vector<std::string>& oWords)
+{
+    EXPECT_EQ(oRun.code, nCode) << oRun.errors;
+    EXPECT_EQ(std::count(oRun.errors.begin(), oRun.errors.end(), '\n'), 1) << oRun.errors;
+    EXPECT_TRUE(oRun.output.empty()) << oRun.output;
+    for (const std::string& word : oWords)
+        EXPECT_NE(oRun.errors.find(word), std::string::npos) << word << " is not in: " << oRun.errors;
+}
+
+void ExpectRefusals(const std::string& verb, const std::vector<Refusal>& oRefusals)
+{
+    for (const Refusal& oRefusal : oRefusals)
+    {
+        std::vector<std::string> oArguments{verb};
+        oArguments.insert(oArguments.end(), oRefusal.moArguments.begin(), oRefusal.moArguments.end());
+        ExpectFailure(RunKrv(oArguments), oRefusal.mnCode, {oRefusal.moWord});
+    }
 }
 
 } // namespace krv::test

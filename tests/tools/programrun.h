@@ -27,4 +27,16 @@ ProgramRun RunProgram(const std::string& program, const std::vector<std::string>
 // The command of this build.
 ProgramRun RunKrv(const std::vector<std::string>& oArguments, const std::vector<std::string>& oEnvironment = {});
 
+// Failed, printed nothing, and said why on one line that holds all the words.
+void ExpectFailure(const ProgramRun& oRun, int nCode, const std::vector<std::string>& oWords);
+
+// Arguments of the command that it refuses, its exit code and a word of what it says.
+struct Refusal
+{
+    std::vector<std::string> moArguments;
+    int mnCode;
+    std::string moWord;
+};
+void ExpectRefusals(const std::string& verb, const std::vector<Refusal>& oRefusals);
+
 } // namespace krv::test

@@ -380,6 +380,12 @@ void FileEditor::StoreStrile(PageModel& oPage, std::uint64_t nStrile, const unsi
         mpoSpace->Release(oNew);
         throw;
     }
+    MoveStrile(oPage, nStrile, oOld, oNew, nBytes);
+}
+
+void FileEditor::MoveStrile(PageModel& oPage, std::uint64_t nStrile, const Extent& oOld, const Extent& oNew,
+                            std::size_t nBytes)
+{
     if (oOld.mnBytes != 0)
         mpoSpace->Release(oOld);
     oPage.moOffsets[nStrile] = oNew.mnOffset;
@@ -415,13 +421,7 @@ std::uint64_t FileEditor::OwnStrile(PageModel& oPage, std::uint64_t nStrile, std
         mpoSpace->Release(oNew);
         throw;
     }
-    if (oOld.mnBytes != 0)
-        mpoSpace->Release(oOld);
-    oPage.moOffsets[nStrile] = oNew.mnOffset;
-    oPage.moByteCounts[nStrile] = nBytes;
-    oPage.moRoom[nStrile] = oNew.mnBytes;
-    oPage.moGenerations[nStrile] = static_cast<std::uint32_t>(oNew.mnGeneration);
-    oPage.mbStrilesChanged = true;
+    MoveStrile(oPage, nStrile, oOld, oNew, nBytes);
     return oNew.mnOffset;
 }
 

@@ -89,6 +89,9 @@ private:
     std::vector<std::uint64_t> ReadArray(const DirectoryEntry& oEntry);
     void CreateFile(bool bBigTiff, bool bGap);
     std::uint64_t GetReserve() const;
+    // Records the new place of a strip or tile and releases the old one.
+    void MoveStrile(PageModel& oPage, std::uint64_t nStrile, const Extent& oOld, const Extent& oNew,
+                    std::size_t nBytes);
     Written WriteDirectory(PageModel& oPage, std::uint64_t nNext, bool bDraft);
     std::vector<Written> WriteDirectories();
     void Commit(const std::vector<Written>& oWritten);

@@ -3,8 +3,8 @@
 #include "datasources/iomanager/formatcapabilities.h"
 #include "tests/support/probe.h"
 #include "tests/support/syntheticdataset.h"
+#include "tests/support/thrown.h"
 #include "toolkit/core/core.h"
-#include "toolkit/exceptions/exceptions.h"
 #include "tools/conformance/formathome.h"
 
 #include <gtest/gtest.h>
@@ -13,7 +13,10 @@
 #include <future>
 
 using namespace krv::datasources;
+using krv::test::ExpectNoPlace;
+using krv::test::ExpectPlace;
 using krv::test::FunctionBuilder;
+using krv::test::Thrown;
 
 namespace
 {
@@ -71,35 +74,6 @@ protected:
     krv::conformance::FormatHome moHome;
 };
 
-template <class Kind, class Operation>
-Kind Catch(const Operation& oOperation)
-{
-    try
-    {
-        oOperation();
-    }
-    catch (const Kind& oException)
-    {
-        return oException;
-    }
-    throw std::logic_error("nothing was thrown");
-}
-
-void ExpectPlace(const krv::Exception& oException, const std::string& function, unsigned int nLine)
-{
-    EXPECT_NE(oException.GetFunction().find("DatasetManager::" + function + "("), std::string::npos)
-        << oException.GetFunction();
-    EXPECT_EQ(oException.GetSourceFile(), SOURCE_FILE);
-    EXPECT_EQ(oException.GetLine(), nLine);
-}
-
-void ExpectNoPlace(const krv::Exception& oException)
-{
-    EXPECT_EQ(oException.GetFunction(), "");
-    EXPECT_EQ(oException.GetSourceFile(), "");
-    EXPECT_EQ(oException.GetLine(), 0u);
-}
-
 } // namespace
 
 TEST_F(DatasetManagerTest, FilesThatNobodyOpens)
@@ -107,7 +81,7 @@ TEST_F(DatasetManagerTest, FilesThatNobodyOpens)
     const std::string missing = moHome.GetFolder().File("missing.bin");
     for (const std::string& name : {missing, std::string(), moHome.GetFolder().GetPath()})
     {
-        const auto oException = Catch<krv::FileNotFoundException>([&] { Manager().Open(name, eReadOnly); });
+        const auto oException = Thrown<krv::FileNotFoundException>([&] { Manager().Open(name, eReadOnly); });
         EXPECT_EQ(oException.GetFileName(), name);
         EXPECT_EQ(oException.GetMessage(), "");
         ExpectNoPlace(oException);
@@ -116,7 +90,7 @@ TEST_F(DatasetManagerTest, FilesThatNobodyOpens)
     for (const std::string& content : {std::string(), std::string("unknown"), std::string(10000, 'x')})
     {
         const std::string name = File(content);
-        const auto oException = Catch<krv::FileFormatException>([&] { Manager().Open(name, eUpdate); });
+        const auto oException = Thrown<krv::FileFormatException>([&] { Manager().Open(name, eUpdate); });
         EXPECT_EQ(oException.GetFileName(), name);
         EXPECT_EQ(oException.GetMessage(), "");
         ExpectNoPlace(oException);
@@ -165,7 +139,7 @@ TEST_F(DatasetManagerTest, TheLastBuilderIsTheOneThatRecognisedEvenIfItsOpenFail
     {
         throw krv::FileFormatException(name, "damaged");
     };
-    EXPECT_EQ(Catch<krv::FileFormatException>([&] { CallsOfOpen("BETA"); }).GetMessage(), "damaged");
+    EXPECT_EQ(Thrown<krv::FileFormatException>([&] { CallsOfOpen("BETA"); }).GetMessage(), "damaged");
     EXPECT_EQ(CallsOfOpen("ALPHA"), (Texts{"BETA::Identify", "ALPHA::Identify", "ALPHA::Open"}));
 }
 
@@ -231,9 +205,9 @@ TEST_F(DatasetManagerTest, RegisteringTwiceOrNothing)
     Register("ALPHA");
     const std::size_t nFormats = Manager().GetFormatList().size();
     FunctionBuilder oTwin("ALPHA", &moProbe);
-    const auto oException = Catch<krv::DataException>([&] { Manager().Register(&oTwin, "", true); });
+    const auto oException = Thrown<krv::DataException>([&] { Manager().Register(&oTwin, "", true); });
     EXPECT_EQ(oException.GetMessage(), "Format already registered: short name=ALPHA");
-    ExpectPlace(oException, "Register", 201);
+    ExpectPlace(oException, "DatasetManager::Register(", SOURCE_FILE, 201);
     EXPECT_THROW(Manager().Register(nullptr, "", false), krv::DataException);
     oTwin.moFormat.reset();
     EXPECT_THROW(Manager().Register(&oTwin, "", false), krv::DataException);
@@ -254,9 +228,9 @@ TEST_F(DatasetManagerTest, FormatsByNameAndTheirCapabilities)
     EXPECT_EQ(Manager().GetFormatByName("KrvDsk"), oUpper.GetFileFormat());
     for (const std::string& name : {std::string("lower"), std::string("Absent"), std::string()})
     {
-        const auto oException = Catch<krv::DataException>([&] { Manager().GetFormatByName(name); });
+        const auto oException = Thrown<krv::DataException>([&] { Manager().GetFormatByName(name); });
         EXPECT_EQ(oException.GetMessage(), "Format not found: short name=" + name);
-        ExpectPlace(oException, "GetFormatByName", 437);
+        ExpectPlace(oException, "DatasetManager::GetFormatByName(", SOURCE_FILE, 437);
     }
 
     const FormatCapabilities& oCapabilities = Manager().GetCapabilities("KRVDSK");
@@ -265,10 +239,10 @@ TEST_F(DatasetManagerTest, FormatsByNameAndTheirCapabilities)
     EXPECT_FALSE(Manager().GetCapabilities("lower").IsSupported(CAPABILITY_CREATE));
     for (const std::string& name : {std::string("krvdsk"), std::string("LOWER"), std::string("Absent")})
     {
-        const auto oException = Catch<krv::Exception>([&] { Manager().GetCapabilities(name); });
+        const auto oException = Thrown<krv::Exception>([&] { Manager().GetCapabilities(name); });
         EXPECT_EQ(oException.GetMessage(), "the format: " + name + " is not registred in the DatasetManager.");
         EXPECT_EQ(typeid(oException), typeid(krv::Exception));
-        ExpectPlace(oException, "GetXMLPath", 468);
+        ExpectPlace(oException, "DatasetManager::GetXMLPath(", SOURCE_FILE, 468);
     }
 }
 
@@ -296,7 +270,7 @@ TEST_F(DatasetManagerTest, OpenFormatKnowsTheOtherBuildersOnly)
 TEST_F(DatasetManagerTest, NewDatasetCreatesOrOpensForUpdate)
 {
     const std::string name = File("BETA");
-    const auto oException = Catch<krv::DataException>([&] { Manager().NewDataset(name, "XYZ", ""); });
+    const auto oException = Thrown<krv::DataException>([&] { Manager().NewDataset(name, "XYZ", ""); });
     EXPECT_EQ(oException.GetMessage(), "Invalid file format type specified for file creation, XYZ");
     ExpectNoPlace(oException);
 

@@ -1,9 +1,6 @@
 #include "datasources/iomanager/formatcapabilities.h"
 
-#include "datasources/iomanager/xalanselect.h"
 #include "tests/support/outputcapture.h"
-#include "toolkit/xml/xmldocument.h"
-#include "toolkit/xml/xmlutil.h"
 #include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
@@ -86,17 +83,4 @@ TEST(FormatCapabilities, FailuresAreDebugOutputAndNo)
         }
     }
     EXPECT_EQ(testing::internal::GetCapturedStderr(), "");
-}
-
-TEST(XalanSelect, ValuesAreTrimmedAndNodesInOrder)
-{
-    const krv::xml::XmlSession oSession;
-    const std::string text = "<a>\n <b><!-- none -->\t first\r\n </b><c>x</c><b/><b>second &#228;</b></a>";
-    const krv::xml::Document oDocument = krv::xml::ParseMemory(text.data(), text.size(), "text");
-    EXPECT_EQ(SelectNodeValue("/a/b", oDocument.Get()), "first");
-    EXPECT_EQ(SelectNodeValue("/a/b[2]", oDocument.Get()), "");
-    EXPECT_EQ(SelectNodeValue("/a/b[3]", oDocument.Get()), "second \xc3\xa4");
-    EXPECT_EQ(SelectNodeValue("/a/none", oDocument.Get()), "");
-    EXPECT_EQ(SelectMultipleNode("/a/b", oDocument.Get()).size(), 3u);
-    EXPECT_TRUE(SelectMultipleNode("/none", oDocument.Get()).empty());
 }

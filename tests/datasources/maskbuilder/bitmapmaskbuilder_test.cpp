@@ -130,28 +130,13 @@ TEST_F(MaskFileTest, AFileWithoutBitmapsIsRefusedAndItsDatasetStays)
         poLeft = poDataset.get();
         return poDataset;
     };
-    try
-    {
-        BitmapMaskBuilder(moFile, 1);
-        FAIL();
-    }
-    catch (const krv::DataException& oError)
-    {
-        EXPECT_EQ(oError.GetMessage(), "Invalid dataset - bitmap not supported");
-        EXPECT_EQ(oError.GetSourceFile(), "datasources/maskbuilder/bitmapmaskbuilder");
-        EXPECT_EQ(oError.GetLine(), 40u);
-        EXPECT_NE(oError.GetFunction().find("BitmapMaskBuilder::BitmapMaskBuilder("), std::string::npos);
-    }
+    const auto oError = Thrown<krv::DataException>([&] { BitmapMaskBuilder(moFile, 1); });
+    EXPECT_EQ(oError.GetMessage(), "Invalid dataset - bitmap not supported");
+    ExpectPlace(oError, "BitmapMaskBuilder::BitmapMaskBuilder(", "datasources/maskbuilder/bitmapmaskbuilder", 40);
     ASSERT_NE(poLeft, nullptr);
     EXPECT_TRUE(poLeft->IsOpen());
     delete poLeft;
 }
-
-class BitmapsAlone : public BitmapPart
-{
-public:
-    using BitmapPart::BitmapPart;
-};
 
 // Exists as often as it is told.
 class Vanishing : public SyntheticDataset
@@ -167,22 +152,14 @@ private:
 void ExpectWriteFails(IBitmapDataset& oDataset, const char* pMessage)
 {
     const Mask oMask(RasterInfo(4, 4, 1, krv::gobs::eDT_BIT), {});
-    try
-    {
-        WriteMask(oDataset, oMask, 1);
-        FAIL() << pMessage;
-    }
-    catch (const krv::DataException& oError)
-    {
-        EXPECT_EQ(oError.GetMessage(), pMessage);
-        EXPECT_EQ(oError.GetFunction() + oError.GetSourceFile(), "");
-        EXPECT_EQ(oError.GetLine(), 0u);
-    }
+    const auto oError = Thrown<krv::DataException>([&] { WriteMask(oDataset, oMask, 1); });
+    EXPECT_EQ(oError.GetMessage(), pMessage);
+    ExpectNoPlace(oError);
 }
 
 TEST_F(MaskFileTest, WritingNeedsADatasetWithAFile)
 {
-    BitmapsAlone oAlone(moModel);
+    Synthetic<BitmapPart> oAlone(moModel);
     ExpectWriteFails(oAlone, "Dataset is not Valid.");
     Vanishing oGone(moModel, 0), oGoing(moModel, 2);
     ExpectWriteFails(oGone, "Dataset doesn't exist.");

@@ -156,44 +156,27 @@ TEST(MetadataFilters, CategoriesSelectTheirTags)
     struct Case
     {
         unsigned long long mnCategories;
-        const char* mpKey;
-        bool mbSelected;
+        std::vector<const char*> moSelected;
+        std::vector<const char*> moDeclined;
     };
-    const Case CASES[] = {{0, "_anything", true},
-                          {0, "_", true},
-                          {0, "TiffType", true},
-                          {0, "a_", false},
-                          {0, "MyDefaultRedChannel", false},
-                          {0, "defaultgray", false},
-                          {0, "Extents", false},
-                          {16, "MyDefaultRedChannel", true},
-                          {16, "defaultgray", true},
-                          {16, "DefaultGrey", false},
-                          {16, "_x", true},
-                          {2, "extents", true},
-                          {4, "Extents", true},
-                          {2, "Extents_Old", false},
-                          {4, "Extents_Old", false},
-                          {8, "default_lut_ref", true},
-                          {8, "JoinTable", true},
-                          {8, "LAYER_CRC", false},
-                          {1, "Histogram_1", true},
-                          {1, "layer_crc", true},
-                          {1, "SAR_Quantity", true},
-                          {1, "MD_IncidentAngle_Scale", true},
-                          {1, "MD_IncidentAngle_Shift", true},
-                          {1, "joins", true},
-                          {1, "Matrix_Type", true},
-                          {1, "NumRangeLooks", true},
-                          {1, "NumAzimuthLooks", true},
-                          {1, "NumAzimuthLooks2", false},
-                          {1, "x_REF", false},
-                          {~31ull, "Extents", false},
-                          {~0ull, "Extents", true}};
+    const Case CASES[] = {{0, {"_anything", "_", "TiffType"}, {"a_", "MyDefaultRedChannel", "defaultgray", "Extents"}},
+                          {1,
+                           {"Histogram_1", "layer_crc", "SAR_Quantity", "MD_IncidentAngle_Scale",
+                            "MD_IncidentAngle_Shift", "joins", "Matrix_Type", "NumRangeLooks", "NumAzimuthLooks"},
+                           {"NumAzimuthLooks2", "x_REF"}},
+                          {2, {"extents"}, {"Extents_Old"}},
+                          {4, {"Extents"}, {"Extents_Old"}},
+                          {8, {"default_lut_ref", "JoinTable"}, {"LAYER_CRC"}},
+                          {16, {"MyDefaultRedChannel", "defaultgray", "_x"}, {"DefaultGrey"}},
+                          {~31ull, {}, {"Extents"}},
+                          {~0ull, {"Extents"}, {}}};
     for (const Case& oCase : CASES)
     {
         const Filter oFilter(GetMetadataFilter(oCase.mnCategories));
-        EXPECT_EQ(Selects(*oFilter, oCase.mpKey), oCase.mbSelected) << oCase.mnCategories << " on " << oCase.mpKey;
+        for (const char* pKey : oCase.moSelected)
+            EXPECT_TRUE(Selects(*oFilter, pKey)) << oCase.mnCategories << " on " << pKey;
+        for (const char* pKey : oCase.moDeclined)
+            EXPECT_FALSE(Selects(*oFilter, pKey)) << oCase.mnCategories << " on " << pKey;
     }
     const Filter oFilter(GetMetadataFilter(eGeocodingTags | eDisplayDefaultTags));
     EXPECT_TRUE(Selects(*oFilter, "Extents") && Selects(*oFilter, "DefaultRed"));

@@ -8,7 +8,7 @@
 #include "gobs/raster/raster.h"
 #include "tests/datasources/metadata/groupinglocale.h"
 #include "tests/support/syntheticdataset.h"
-#include "toolkit/exceptions/exceptions.h"
+#include "tests/support/thrown.h"
 
 #include <gtest/gtest.h>
 
@@ -116,17 +116,11 @@ TEST(NoDataMaskBuilder, TextsThatAreNoNumberThrow)
     {
         for (const bool bOfFile : {false, true})
         {
-            try
-            {
-                Builder(GetNoDataMaskBuilder(bOfFile ? Record("", pText) : Record(pText, "1"), krv::gobs::eAnyChannel));
-                ADD_FAILURE() << "nothing thrown for " << pText;
-            }
-            catch (const krv::Exception& oError)
-            {
-                EXPECT_EQ(oError.GetMessage(), std::string("Could not parse nodata value \"") + pText + "\"");
-                EXPECT_EQ(oError.GetFunction() + oError.GetSourceFile(), "");
-                EXPECT_EQ(oError.GetLine(), 0u);
-            }
+            const AuxiliaryData oData = bOfFile ? Record("", pText) : Record(pText, "1");
+            const auto oError = krv::test::Thrown<krv::Exception>(
+                [&] { Builder(GetNoDataMaskBuilder(oData, krv::gobs::eAnyChannel)); });
+            EXPECT_EQ(oError.GetMessage(), std::string("Could not parse nodata value \"") + pText + "\"");
+            krv::test::ExpectNoPlace(oError);
         }
     }
 }

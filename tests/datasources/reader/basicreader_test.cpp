@@ -30,47 +30,54 @@ protected:
     // Every public constructor over three channels, or two bitmaps; mpoOpen is the dataset of those that take one.
     std::vector<Constructor> Constructors()
     {
-        const auto Facet = [this]<class Interface>(Interface*)
-        {
-            return dynamic_cast<Interface*>(mpoOpen.get());
-        };
-        const auto FromFile = [this](const auto&... oArguments)
-        {
-            return [=, this]
-            {
-                return std::make_unique<BasicReader>(moFile, oArguments...);
-            };
-        };
         return {
-            {"file", FromFile(), true},
-            {"file and channels", FromFile(Channels{3, 1, 2})},
-            {"file and no channels", FromFile(Channels{})},
-            {"file and filter", FromFile(moFilter)},
-            {"bitmaps",
-             [=]
+            {"file", [this] { return New(moFile); }, true},
+            {"file and channels",
+             [this]
              {
-                 return std::make_unique<BasicReader>(Facet((IBitmapDataset*)nullptr), Channels{7, 2}, false);
+                 return New(moFile, Channels{3, 1, 2});
+             }},
+            {"file and no channels",
+             [this]
+             {
+                 return New(moFile, Channels{});
+             }},
+            {"file and filter",
+             [this]
+             {
+                 return New(moFile, moFilter);
+             }},
+            {"bitmaps",
+             [this]
+             {
+                 return New(dynamic_cast<IBitmapDataset*>(mpoOpen.get()), Channels{7, 2}, false);
              }},
             {"dataset",
              [this]
              {
-                 return std::make_unique<BasicReader>(mpoOpen.get(), Channels{2, 2, 3}, false);
+                 return New(mpoOpen.get(), Channels{2, 2, 3}, false);
              }},
             {"own dataset",
              [this]
              {
-                 auto oReader = std::make_unique<BasicReader>(mpoOpen.get(), Channels{}, true);
+                 auto oReader = New(mpoOpen.get(), Channels{}, true);
                  [[maybe_unused]] IDataset* const poTakenOver = mpoOpen.release();
                  return oReader;
              }},
             {"level",
-             [=]
+             [this]
              {
-                 auto* const poRaster = Facet((IRasterDataset*)nullptr);
+                 auto* const poRaster = dynamic_cast<IRasterDataset*>(mpoOpen.get());
                  const std::unique_ptr<IOverviewManager> oManager(poRaster->GetOverviewManager());
-                 return std::make_unique<BasicReader>(poRaster, oManager->GetOverviewIO(2, {1, 2}), Channels{1, 2});
+                 return New(poRaster, oManager->GetOverviewIO(2, {1, 2}), Channels{1, 2});
              }},
         };
+    }
+
+    template <class... Arguments>
+    static ReaderPtr New(const Arguments&... oArguments)
+    {
+        return std::make_unique<BasicReader>(oArguments...);
     }
 
     // Every reading operation; results go at once.
@@ -149,57 +156,43 @@ TEST_F(BasicReaderTest, NothingLeaksWhicheverCallFails)
 
 TEST_F(BasicReaderTest, ConstructorsCheckTheirArguments)
 {
-    const auto WithoutRaster = [this]
-    {
-        moMakeDataset = [this]
-        {
-            return std::make_unique<DatasetWithoutRaster>(moModel);
-        };
-    };
-    const auto WithoutChannels = [this]
-    {
-        moMakeDataset = [this]
-        {
-            return Decorate(moProbe, std::make_unique<SyntheticDataset>(moModel));
-        };
-        moModel->moTypes.clear();
-    };
     const Channels oAll;
-    WithoutRaster();
-    EXPECT_EQ(Error([&] { BasicReader(moFile, oAll); }), "data: Format does not support rasters: file=" + moFile);
-    EXPECT_EQ(Error([&] { BasicReader(moFile, moFilter); }), "data: Format does not support rasters: file=" + moFile);
-    EXPECT_EQ(Error([&] { BasicReader{moFile}; }), "data: Format does not support rasters: file=" + moFile);
-    const auto oBare = MakeDataset();
-    EXPECT_EQ(Error([&] { BasicReader(oBare.get(), oAll, false); }), "data: This dataset doesn't support Raster.");
     EXPECT_EQ(Error([&] { BasicReader((IDataset*)nullptr, oAll, false); }), "data: The dataset is NULL");
     EXPECT_EQ(Error([&] { BasicReader((IBitmapDataset*)nullptr, oAll, true); }), "data: The dataset is NULL");
     Synthetic<BitmapPart> oBitmaps(moModel);
     EXPECT_EQ(Error([&] { BasicReader((IBitmapDataset*)&oBitmaps, oAll, false); }), "data: The dataset is NULL");
-
     Synthetic<RasterPart> oRaster(moModel);
-    const auto NewIO = [&]
-    {
-        return oRaster.GetRasterIO({1});
-    };
-    EXPECT_EQ(Error([&] { BasicReader(nullptr, NewIO(), {1}); }), "data: Invalid Raster Dataset: poRDS cannot be NULL");
-    EXPECT_EQ(Error([&] { BasicReader(&oRaster, nullptr, {1}); }),
-              "data: Invalid Raster IO: poRasterIO cannot be NULL");
-    EXPECT_EQ(Error([&] { BasicReader(&oRaster, NewIO(), {1}); }), "data: Invalid Raster Dataset");
+    IRasterIO* const poNone = nullptr;
+    EXPECT_EQ(Error([&] { BasicReader(nullptr, oRaster.GetRasterIO({1}), {1}); }),
+              "data: Invalid Raster Dataset: poRDS cannot be NULL");
+    EXPECT_EQ(Error([&] { BasicReader(&oRaster, poNone, {1}); }), "data: Invalid Raster IO: poRasterIO cannot be NULL");
+    EXPECT_EQ(Error([&] { BasicReader(&oRaster, oRaster.GetRasterIO({1}), {1}); }), "data: Invalid Raster Dataset");
 
-    IRasterIO* const poIO = NewIO();
-    WithoutChannels();
+    IRasterIO* const poIO = oRaster.GetRasterIO({1});
+    moModel->moTypes.clear();
+    moModel->moBitmaps.clear();
     const auto oEmpty = MakeDataset();
+    auto* const poEmptyRaster = dynamic_cast<IRasterDataset*>(oEmpty.get());
+    auto* const poEmptyBitmaps = dynamic_cast<IBitmapDataset*>(oEmpty.get());
     EXPECT_EQ(Error([&] { BasicReader(moFile, oAll); }), "data: No available channels.");
     EXPECT_EQ(Error([&] { BasicReader(moFile, moFilter); }), "data: No channels in dataset: file=" + moFile);
     EXPECT_EQ(Error([&] { BasicReader{moFile}; }), "data: No channels in dataset: file=" + moFile);
     EXPECT_EQ(Error([&] { BasicReader(oEmpty.get(), oAll, false); }), "data: No available channels.");
-    EXPECT_EQ(Error([&] { BasicReader(dynamic_cast<IRasterDataset*>(oEmpty.get()), poIO, oAll); }),
-              "data: No available channels.");
-    moModel->moBitmaps.clear();
-    EXPECT_EQ(Error([&] { BasicReader(dynamic_cast<IBitmapDataset*>(oEmpty.get()), oAll, false); }),
-              "data: Bitmap list is empty");
+    EXPECT_EQ(Error([&] { BasicReader(poEmptyRaster, poIO, oAll); }), "data: No available channels.");
+    EXPECT_EQ(Error([&] { BasicReader(poEmptyBitmaps, oAll, false); }), "data: Bitmap list is empty");
     EXPECT_EQ(moProbe.GetLive(), 1); // oEmpty: ownership was never taken
     EXPECT_THROW(BasicReader(moHome.GetFolder().File("missing")), krv::FileNotFoundException);
+
+    moMakeDataset = [this]
+    {
+        return std::make_unique<DatasetWithoutRaster>(moModel);
+    };
+    const std::string error = "data: Format does not support rasters: file=" + moFile;
+    EXPECT_EQ(Error([&] { BasicReader(moFile, oAll); }), error);
+    EXPECT_EQ(Error([&] { BasicReader(moFile, moFilter); }), error);
+    EXPECT_EQ(Error([&] { BasicReader{moFile}; }), error);
+    const auto oBare = MakeDataset();
+    EXPECT_EQ(Error([&] { BasicReader(oBare.get(), oAll, false); }), "data: This dataset doesn't support Raster.");
 }
 
 TEST_F(BasicReaderTest, ExceptionsOfConstructorsNameTheirPlace)
@@ -213,18 +206,9 @@ TEST_F(BasicReaderTest, ExceptionsOfConstructorsNameTheirPlace)
                                                                     BasicReader(MakeDataset().get(), {}, false);
                                                                 }})
     {
-        try
-        {
-            oMake();
-            FAIL();
-        }
-        catch (const krv::DataException& oException)
-        {
-            EXPECT_EQ(oException.GetSourceFile(), "datasources/reader/basicreader");
-            EXPECT_NE(oException.GetFunction().find("BasicReader::BasicReader("), std::string::npos)
-                << oException.GetFunction();
-            EXPECT_GT(oException.GetLine(), 0u);
-        }
+        const auto oException = Thrown<krv::DataException>(oMake);
+        ExpectPlace(oException, "BasicReader::BasicReader(", "datasources/reader/basicreader", oException.GetLine());
+        EXPECT_GT(oException.GetLine(), 0u);
     }
 }
 
@@ -259,26 +243,10 @@ TEST_F(BasicReaderTest, AnswersFromEveryConstructor)
             std::unique_ptr<IOverviewReaderAccessor>(oReader->GetOverviewReaderAccessor()) != nullptr;
         EXPECT_EQ(bHasAccessor, !bLevel && !bBitmaps);
 
-        const RasterPtr oWhole(oReader->ReadRaster(0, 0, oReader->GetWidth(), oReader->GetHeight()));
-        EXPECT_EQ(Bytes(*oWhole), bLevel     ? LevelImage(*moModel, 2, oChannels)
-                                  : bBitmaps ? BitmapImage(*moModel, oChannels)
-                                             : Image(oChannels).moBytes);
+        EXPECT_EQ(ReadPixels(*oReader), bLevel     ? LevelImage(*moModel, 2, oChannels)
+                                        : bBitmaps ? BitmapImage(*moModel, oChannels)
+                                                   : Image(oChannels).moBytes);
     }
-}
-
-TEST_F(BasicReaderTest, OwnershipOfDatasets)
-{
-    {
-        const BasicReader oReader(MakeDataset().release(), {}, true);
-        const BasicReader oMasks(dynamic_cast<IBitmapDataset*>(MakeDataset().release()), {}, true);
-        EXPECT_GT(moProbe.GetLive(), 2);
-    }
-    EXPECT_EQ(moProbe.GetLive(), 0);
-    const auto oDataset = MakeDataset();
-    {
-        const BasicReader oReader(oDataset.get(), {}, false);
-    }
-    EXPECT_EQ(moProbe.GetLive(), 1);
 }
 
 TEST_F(BasicReaderTest, TilesCoverTheImage)
@@ -296,7 +264,7 @@ TEST_F(BasicReaderTest, TilesCoverTheImage)
         for (const RasterPtr& oTile : RasterRange(oReader))
         {
             nPixels += std::size_t(oTile->GetWidth()) * oTile->GetHeight();
-            EXPECT_EQ(Bytes(*oTile),
+            EXPECT_EQ(PixelsOf(*oTile),
                       oImage.Window(oTile->GetX(), oTile->GetY(), oTile->GetWidth(), oTile->GetHeight()));
             EXPECT_LE(oTile->GetWidth(), std::max(1u, nTileWidth));
             const RasterPtr oFound(*oReader.FindRaster(oTile->GetX() + oTile->GetWidth() - 1, oTile->GetY()));
@@ -376,10 +344,8 @@ TEST_F(BasicReaderTest, RandomWindowsWithMarginsEqualTheNaiveModel)
             krv::gobs::Raster oRaster({nWidth, nHeight, oReader.GetChansCount(), oReader.GetDataType()},
                                       {static_cast<int>(nX), static_cast<int>(nY), nXMargin, nYMargin});
             oReader.ReadRaster(&oRaster);
-            ASSERT_EQ(Bytes(oRaster), oImage.WithMargins(nX, nY, nWidth, nHeight, nXMargin, nYMargin, eBehaviour))
-                << "seed " << nSeed << ", window " << nX << "," << nY << " " << nWidth << "x" << nHeight << " of "
-                << moModel->mnWidth << "x" << moModel->mnHeight << ", margins " << nXMargin << "," << nYMargin
-                << ", behaviour " << eBehaviour;
+            ASSERT_EQ(PixelsOf(oRaster), oImage.WithMargins(nX, nY, nWidth, nHeight, nXMargin, nYMargin, eBehaviour))
+                << "seed " << nSeed << ", window " << nWindow;
         }
     }
 }

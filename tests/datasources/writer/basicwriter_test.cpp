@@ -233,18 +233,7 @@ TEST_F(BasicWriterTest, FailuresLeaveNothing)
         },
     };
     for (const auto& oOperation : OPERATIONS)
-    {
-        bool bThrown = true;
-        for (unsigned int nCall = 1; bThrown; ++nCall)
-        {
-            moModel->moLevels.clear();
-            moProbe.Arm(nCall);
-            Error(oOperation);
-            bThrown = moProbe.HasThrown();
-            ASSERT_EQ(moProbe.GetLive(), 0) << "call " << nCall;
-            ASSERT_FALSE(moProbe.HasOrphans()) << "call " << nCall;
-        }
-    }
+        FailAtEveryCall(oOperation, [&] { moModel->moLevels.clear(); });
 }
 
 } // namespace krv::test

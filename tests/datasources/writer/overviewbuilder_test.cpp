@@ -4,6 +4,7 @@
 #include "datasources/writer/basicwriter.h"
 #include "datasources/writer/ioverviewwriteraccessor.h"
 #include "tests/datasources/reader/readertest.h"
+#include "tests/support/conversionmodel.h"
 #include "tests/support/facts.h"
 
 #include <cmath>
@@ -47,35 +48,17 @@ struct Picture
     }
 };
 
-template <typename T>
-void Convert(std::vector<Real>& oValues, std::string& bytes, bool bToBytes)
-{
-    for (std::size_t n = 0; n < oValues.size(); ++n)
-    {
-        T nSample = bToBytes ? static_cast<T>(oValues[n]) : T();
-        if (bToBytes)
-            std::memcpy(bytes.data() + n * sizeof(T), &nSample, sizeof(T));
-        std::memcpy(&nSample, bytes.data() + n * sizeof(T), sizeof(T));
-        oValues[n] = nSample;
-    }
-}
-
+// Samples are stored as the type can hold them, and come back so.
 void ConvertAs(const DataType& oType, std::vector<Real>& oValues, std::string& bytes, bool bToBytes)
 {
-    const unsigned int nBits = oType.GetBits();
-    if (oType.IsReal())
-        return nBits == 32 ? Convert<float>(oValues, bytes, bToBytes) : Convert<double>(oValues, bytes, bToBytes);
-    if (nBits == 8)
-        return oType.IsSigned() ? Convert<std::int8_t>(oValues, bytes, bToBytes)
-                                : Convert<std::uint8_t>(oValues, bytes, bToBytes);
-    if (nBits == 16)
-        return oType.IsSigned() ? Convert<std::int16_t>(oValues, bytes, bToBytes)
-                                : Convert<std::uint16_t>(oValues, bytes, bToBytes);
-    if (nBits == 32)
-        return oType.IsSigned() ? Convert<std::int32_t>(oValues, bytes, bToBytes)
-                                : Convert<std::uint32_t>(oValues, bytes, bToBytes);
-    return oType.IsSigned() ? Convert<std::int64_t>(oValues, bytes, bToBytes)
-                            : Convert<std::uint64_t>(oValues, bytes, bToBytes);
+    const Part& oPart = *Type(oType.GetNativeCode()).mpoPart;
+    for (std::size_t n = 0; n < oValues.size(); ++n)
+    {
+        auto* const pSample = reinterpret_cast<unsigned char*>(bytes.data()) + n * oPart.mnBytes;
+        if (bToBytes)
+            oPart.Store(pSample, oValues[n]);
+        oValues[n] = oPart.Load(pSample);
+    }
 }
 
 struct Case
@@ -282,8 +265,7 @@ protected:
         const std::unique_ptr<IOverviewWriterAccessor> oLevels(oWriter.GetOverviewWriterAccessor());
         EXPECT_TRUE(oLevels->IsLevelValid(nFactor)) << nFactor;
         const std::unique_ptr<IRasterWriter> oLevel(oLevels->CreateRasterWriter(nFactor));
-        const RasterPtr oRaster(oLevel->ReadRaster(0, 0, oLevel->GetWidth(), oLevel->GetHeight()));
-        return Bytes(*oRaster);
+        return ReadPixels(*oLevel);
     }
 
     // The level of the mask says where the level is valid.
@@ -564,11 +546,10 @@ TEST_F(OverviewBuilderTest, RealFilesGetTheirLevels)
         BasicWriter oWriter(file);
         oCase.mnWidth = oWriter.GetWidth();
         oCase.mnHeight = oWriter.GetHeight();
-        const RasterPtr oRaster(oWriter.ReadRaster(0, 0, oCase.mnWidth, oCase.mnHeight));
         oImage = {oCase.mnWidth, oCase.mnHeight, oCase.mnChannels, {}, {}};
         oImage.moValues.resize(std::size_t{oCase.mnWidth} * oCase.mnHeight * oCase.mnChannels);
         oImage.moValid.assign(oImage.moValues.size(), true);
-        std::string bytes = Bytes(*oRaster);
+        std::string bytes = ReadPixels(oWriter);
         ConvertAs(oCase.meType, oImage.moValues, bytes, false);
         std::vector<unsigned char> oBits(std::size_t{oCase.mnWidth} * oCase.mnHeight, 1);
         if (oCase.mbMask)

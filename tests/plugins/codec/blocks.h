@@ -1,8 +1,6 @@
 #pragma once
 
-#include "tests/support/memorytiff.h"
-
-#include <cstdint>
+#include <algorithm>
 #include <memory>
 #include <random>
 #include <string>
@@ -73,28 +71,6 @@ inline Bytes MakeData(std::mt19937& oRandom, unsigned int nKind, std::size_t nCo
         }
     }
     return oBytes;
-}
-
-// The one stored strip of a row of bytes that libtiff coded.
-inline Bytes MakeStrip(const Bytes& oRow, std::uint16_t nCompression)
-{
-    MemoryTiff oMemory;
-    {
-        const auto oFile = oMemory.Open("w");
-        TIFF* tif = oFile.get();
-        TIFFSetField(tif, TIFFTAG_IMAGEWIDTH, static_cast<std::uint32_t>(oRow.size()));
-        TIFFSetField(tif, TIFFTAG_IMAGELENGTH, 1);
-        TIFFSetField(tif, TIFFTAG_ROWSPERSTRIP, 1);
-        TIFFSetField(tif, TIFFTAG_BITSPERSAMPLE, 8);
-        TIFFSetField(tif, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
-        TIFFSetField(tif, TIFFTAG_COMPRESSION, nCompression);
-        Bytes oCopy = oRow; // libtiff works in its argument
-        TIFFWriteEncodedStrip(tif, 0, oCopy.data(), static_cast<tmsize_t>(oCopy.size()));
-    }
-    const auto oFile = oMemory.Open("r");
-    Bytes oStrip(TIFFGetStrileByteCount(oFile.get(), 0));
-    TIFFReadRawStrip(oFile.get(), 0, oStrip.data(), static_cast<tmsize_t>(oStrip.size()));
-    return oStrip;
 }
 
 } // namespace krv::test

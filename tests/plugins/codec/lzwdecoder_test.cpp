@@ -165,21 +165,6 @@ void ExpectAsTextbook(LzwDecoder& oDecoder, const Bytes& oInput, std::size_t nOu
     ASSERT_TRUE(oExpected == oOutput.ToBytes(oResult.mnBytes)) << what;
 }
 
-TEST(LzwDecoder, DecodesWhatLibtiffWrites)
-{
-    LzwDecoder oDecoder;
-    for (unsigned int nSeed = 0; nSeed < 60; ++nSeed)
-    {
-        std::mt19937 oRandom(nSeed);
-        const std::size_t nCount = nSeed < 12 ? nSeed + 1 : 1 + oRandom() % 200000;
-        const Bytes oData = krv::test::MakeData(oRandom, nSeed, nCount);
-        Exact oStrip(krv::test::MakeStrip(oData, COMPRESSION_LZW)), oOutput(nCount);
-        const Result oResult = oDecoder.Decode(oStrip.data(), oStrip.size(), oOutput.data(), oOutput.size());
-        ASSERT_EQ(Status::eDone, oResult.moStatus) << "seed " << nSeed;
-        ASSERT_TRUE(oData == oOutput.ToBytes()) << "seed " << nSeed;
-    }
-}
-
 TEST(LzwDecoder, DecodesEveryLiberty)
 {
     LzwDecoder oDecoder;

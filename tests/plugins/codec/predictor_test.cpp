@@ -93,8 +93,7 @@ Case MakeCase(unsigned int nSeed, const std::vector<std::size_t>& oSampleBytes, 
         oCase.moPlain.push_back(krv::test::RandomBytes(oRandom, oShape.GetRowBytes()));
         oCase.moCoded.push_back(oCoding(oCase.moPlain.back(), oShape.mnChannels, oShape.mnSampleBytes));
     }
-    oCase.moText = "seed " + std::to_string(nSeed) + ": " + std::to_string(oShape.mnWidth) + " pixels of " +
-                   std::to_string(oShape.mnChannels) + " x " + std::to_string(oShape.mnSampleBytes) + " bytes";
+    oCase.moText = "seed " + std::to_string(nSeed);
     return oCase;
 }
 

@@ -1,6 +1,7 @@
 #include "plugins/tif/geokeys.h"
 #include "tests/support/facts.h"
-#include "toolkit/exceptions/exceptions.h"
+#include "tests/support/thrown.h"
+#include "tests/support/tiffwriter.h"
 #include "toolkit/ogc/cs/coordinatetransformation.h"
 #include "toolkit/ogc/cs/crsfactory.h"
 
@@ -12,6 +13,7 @@
 #include <filesystem>
 #include <limits>
 #include <map>
+#include <optional>
 
 #include <geotiff.h>
 #include <geovalues.h>
@@ -21,16 +23,11 @@
 using namespace krv::plugins::tif;
 using namespace krv::ogc::cs;
 using krv::test::DataFolder;
+using krv::test::TiffFile;
 using ::testing::HasSubstr;
 
 namespace
 {
-
-struct CloseTiff
-{
-    void operator()(TIFF* poFile) const { TIFFClose(poFile); }
-};
-using TiffFile = std::unique_ptr<TIFF, CloseTiff>;
 
 // Geographic keys as a writer lays them out.
 class Keys
@@ -82,7 +79,7 @@ TiffFile NewTiff()
     RegisterGeoTags();
     TIFFSetWarningHandler(nullptr);
     const auto path = std::filesystem::temp_directory_path() / ("geokeys" + std::to_string(::getpid()) + ".tif");
-    TiffFile poFile(TIFFOpen(path.c_str(), "w"));
+    TiffFile poFile = krv::test::NewTiff(path);
     std::filesystem::remove(path);
     return poFile;
 }
@@ -113,16 +110,9 @@ std::string ErrorOf(const std::vector<std::uint16_t>& oDirectory, const std::vec
 {
     const TiffFile poFile = NewTiff();
     SetKeys(poFile.get(), oDirectory, oDoubles, "");
-    try
-    {
-        ReadCRS(poFile.get());
-    }
-    catch (const krv::DataException& oException)
-    {
-        EXPECT_THAT(oException.what(), HasSubstr(TIFFFileName(poFile.get())));
-        return oException.what();
-    }
-    return "no exception";
+    const std::string error = krv::test::Error([&] { ReadCRS(poFile.get()); });
+    EXPECT_THAT(error, HasSubstr(TIFFFileName(poFile.get())));
+    return error;
 }
 
 std::string ErrorOf(const Keys& oKeys)
@@ -200,20 +190,32 @@ TEST(GeoKeysOfRealFiles, DefinitionsWithoutCodesAreTheSystemsTheyAreNamedAfter)
 
 TEST(GeoKeys, GeocodingIsForTheOuterCorner)
 {
+    const double nNaN = std::numeric_limits<double>::quiet_NaN();
     struct Case
     {
         std::vector<double> scale, ties, matrix;
-        int rasterType;
-        std::array<double, 6> expected;
+        int rasterType = 1;
+        std::optional<std::array<double, 6>> expected; // nothing: there is no geocoding in it
     };
+    using Terms = std::array<double, 6>;
     const std::vector<double> MATRIX = {3, 1, 0, 500, 1, -2, 0, 900, 0, 0, 0, 0, 0, 0, 0, 1};
-    const Case CASES[] = {{{2, 4, 0}, {0, 0, 0, 100, 200, 0}, {}, 1, {100, 2, 0, 200, 0, -4}},
-                          {{2, 4, 0}, {0, 0, 0, 100, 200, 0}, {}, 2, {99, 2, 0, 202, 0, -4}},
-                          {{2, 4, 0}, {10, 5, 0, 100, 200, 0}, {}, 0, {80, 2, 0, 220, 0, -4}},
-                          {{2, 4, 0}, {0, 0, 0, 1, 1, 0, 9, 9, 0, 9, 9, 0}, {}, 1, {1, 2, 0, 1, 0, -4}},
-                          {{}, {}, MATRIX, 1, {500, 3, 1, 900, 1, -2}},
-                          {{}, {}, MATRIX, 2, {498, 3, 1, 900.5, 1, -2}},
-                          {{2, 4, 0}, {0, 0, 0, 100, 200, 0}, MATRIX, 1, {500, 3, 1, 900, 1, -2}}};
+    const Case CASES[] = {{{2, 4, 0}, {0, 0, 0, 100, 200, 0}, {}, 1, Terms{100, 2, 0, 200, 0, -4}},
+                          {{2, 4, 0}, {0, 0, 0, 100, 200, 0}, {}, 2, Terms{99, 2, 0, 202, 0, -4}},
+                          {{2, 4, 0}, {10, 5, 0, 100, 200, 0}, {}, 0, Terms{80, 2, 0, 220, 0, -4}},
+                          {{2, 4, 0}, {0, 0, 0, 1, 1, 0, 9, 9, 0, 9, 9, 0}, {}, 1, Terms{1, 2, 0, 1, 0, -4}},
+                          {{}, {}, MATRIX, 1, Terms{500, 3, 1, 900, 1, -2}},
+                          {{}, {}, MATRIX, 2, Terms{498, 3, 1, 900.5, 1, -2}},
+                          {{2, 4, 0}, {0, 0, 0, 100, 200, 0}, MATRIX, 1, Terms{500, 3, 1, 900, 1, -2}},
+                          {{}, {}, {}, 1, {}},
+                          {{}, {0, 0, 0, 1, 1, 0}, {}, 1, {}},
+                          {{}, {0, 0, 0, 1, 1, 0, 9, 9, 0, 9, 9, 0}, {}, 1, {}},
+                          {{2, 4, 0}, {}, {}, 1, {}},
+                          {{2, 4, 0}, {0, 0, 0, 1, 1}, {}, 1, {}},
+                          {{0, 4, 0}, {0, 0, 0, 1, 1, 0}, {}, 1, {}},
+                          {{2, nNaN, 0}, {0, 0, 0, 1, 1, 0}, {}, 1, {}},
+                          {{2, 4, 0}, {0, 0, 0, INFINITY, 1, 0}, {}, 1, {}},
+                          {{}, {}, std::vector<double>(16, 0.0), 1, {}},
+                          {{}, {}, std::vector<double>(12, 1.0), 1, {}}};
     for (const Case& oCase : CASES)
     {
         const TiffFile poFile = NewTiff();
@@ -221,39 +223,10 @@ TEST(GeoKeys, GeocodingIsForTheOuterCorner)
         SetDoubles(poFile.get(), TIFFTAG_GEOTIEPOINTS, oCase.ties);
         SetDoubles(poFile.get(), TIFFTAG_GEOTRANSMATRIX, oCase.matrix);
         SetKeys(poFile.get(), Keys().Code(GTRasterTypeGeoKey, oCase.rasterType).Directory(), {}, "");
-        GeocodingInfo oInfo;
-        ASSERT_TRUE(ReadGeocoding(poFile.get(), oInfo));
-        ExpectTerms(oInfo, oCase.expected);
-        EXPECT_EQ(ReadCRS(poFile.get()), nullptr);
-    }
-}
-
-TEST(GeoKeys, ThereIsNoGeocodingInWhatCannotBeOne)
-{
-    const double nNaN = std::numeric_limits<double>::quiet_NaN();
-    struct Case
-    {
-        std::vector<double> scale, ties, matrix;
-    };
-    const Case CASES[] = {{{}, {}, {}},
-                          {{}, {0, 0, 0, 1, 1, 0}, {}},
-                          {{}, {0, 0, 0, 1, 1, 0, 9, 9, 0, 9, 9, 0}, {}},
-                          {{2, 4, 0}, {}, {}},
-                          {{2, 4, 0}, {0, 0, 0, 1, 1}, {}},
-                          {{0, 4, 0}, {0, 0, 0, 1, 1, 0}, {}},
-                          {{2, nNaN, 0}, {0, 0, 0, 1, 1, 0}, {}},
-                          {{2, 4, 0}, {0, 0, 0, INFINITY, 1, 0}, {}},
-                          {{}, {}, std::vector<double>(16, 0.0)},
-                          {{}, {}, std::vector<double>(12, 1.0)}};
-    for (const Case& oCase : CASES)
-    {
-        const TiffFile poFile = NewTiff();
-        SetDoubles(poFile.get(), TIFFTAG_GEOPIXELSCALE, oCase.scale);
-        SetDoubles(poFile.get(), TIFFTAG_GEOTIEPOINTS, oCase.ties);
-        SetDoubles(poFile.get(), TIFFTAG_GEOTRANSMATRIX, oCase.matrix);
         GeocodingInfo oInfo(7, 7, 0, 7, 0, 7);
-        EXPECT_FALSE(ReadGeocoding(poFile.get(), oInfo));
-        EXPECT_EQ(oInfo, GeocodingInfo(7, 7, 0, 7, 0, 7));
+        ASSERT_EQ(ReadGeocoding(poFile.get(), oInfo), oCase.expected.has_value());
+        ExpectTerms(oInfo, oCase.expected.value_or(Terms{7, 7, 0, 7, 0, 7}));
+        EXPECT_EQ(ReadCRS(poFile.get()), nullptr);
     }
 }
 

@@ -1,13 +1,12 @@
 #include "tests/plugins/tif/tifsupport.h"
+#include "tests/support/tiffwriter.h"
 
 #include <gtest/gtest.h>
-#include <tiffio.h>
 
 namespace
 {
 
-using krv::test::OpenTif;
-using krv::test::TemporaryFile;
+using namespace krv::test;
 
 constexpr unsigned int WIDTH = 20000;
 constexpr unsigned int HEIGHT = 10200; // 194 MiB as handed out
@@ -15,32 +14,29 @@ constexpr unsigned int HEIGHT = 10200; // 194 MiB as handed out
 // One compressed strip of one-bit pixels: the eight pixels of a byte are the bits of the row's number.
 void MakeHugeStrip(const std::string& fileName)
 {
-    TIFF* poTiff = TIFFOpen(fileName.c_str(), "w");
-    ASSERT_NE(poTiff, nullptr);
-    TIFFSetField(poTiff, TIFFTAG_IMAGEWIDTH, WIDTH);
-    TIFFSetField(poTiff, TIFFTAG_IMAGELENGTH, HEIGHT);
-    TIFFSetField(poTiff, TIFFTAG_BITSPERSAMPLE, 1);
-    TIFFSetField(poTiff, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
-    TIFFSetField(poTiff, TIFFTAG_COMPRESSION, COMPRESSION_ADOBE_DEFLATE);
-    TIFFSetField(poTiff, TIFFTAG_ROWSPERSTRIP, HEIGHT);
+    const TiffFile poTiff = NewTiff(fileName);
+    SetForm(poTiff.get(), {.mnWidth = WIDTH,
+                           .mnHeight = HEIGHT,
+                           .mnBits = 1,
+                           .mnCompression = COMPRESSION_ADOBE_DEFLATE,
+                           .mnRows = HEIGHT});
     for (unsigned int nRow = 0; nRow < HEIGHT; ++nRow)
     {
-        std::vector<unsigned char> oRow(WIDTH / 8, static_cast<unsigned char>(nRow));
-        TIFFWriteScanline(poTiff, oRow.data(), nRow, 0);
+        Bytes oRow(WIDTH / 8, static_cast<unsigned char>(nRow));
+        TIFFWriteScanline(poTiff.get(), oRow.data(), nRow, 0);
     }
-    TIFFClose(poTiff);
 }
 
 TEST(TifRows, StripThatIsTooLargeToDecodeAtOnceIsReadRowByRow)
 {
-    const TemporaryFile oName;
-    MakeHugeStrip(oName.GetName());
-    const OpenTif oFile(oName.GetName());
-    const std::unique_ptr<krv::datasources::IRasterIO> poIO(oFile->GetRasterIO({1}));
+    const TempFolder oFolder;
+    MakeHugeStrip(oFolder.File("strip.tif"));
+    const TifPointer oFile = OpenTif(oFolder.File("strip.tif"));
+    const IOPointer poIO(oFile->GetRasterIO({1}));
     EXPECT_LT(poIO->GetTileHeight(), HEIGHT / 2);
     for (const unsigned int nY : {0u, 5000u, HEIGHT - 40, 17u, 90u})
     {
-        std::vector<unsigned char> oPixels(100 * 40);
+        Bytes oPixels(100 * 40);
         poIO->ReadWindow(803u, nY, 100u, 40u, oPixels.data());
         for (unsigned int nRow = 0; nRow < 40; ++nRow)
             for (unsigned int nColumn = 0; nColumn < 100; ++nColumn)
@@ -59,20 +55,18 @@ TEST(TifRows, BlocksOfStripsAreSensibleAndNeverTheWholeImage)
     for (const Case& oCase : {Case{100, 80, 8, 1}, Case{8192, 8192, 1, 8}, Case{8192, 8192, 8192, 1},
                               Case{3000, 3000, 3000, 8}, Case{100, 20, 3, 8}})
     {
-        const TemporaryFile oName;
-        TIFF* poTiff = TIFFOpen(oName.GetName().c_str(), "w");
-        ASSERT_NE(poTiff, nullptr);
-        TIFFSetField(poTiff, TIFFTAG_IMAGEWIDTH, oCase.width);
-        TIFFSetField(poTiff, TIFFTAG_IMAGELENGTH, oCase.height);
-        TIFFSetField(poTiff, TIFFTAG_BITSPERSAMPLE, 8);
-        TIFFSetField(poTiff, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
-        TIFFSetField(poTiff, TIFFTAG_COMPRESSION, oCase.compression);
-        TIFFSetField(poTiff, TIFFTAG_ROWSPERSTRIP, oCase.rowsPerStrip);
-        std::vector<unsigned char> oStrip(std::size_t{oCase.width} * oCase.rowsPerStrip);
-        TIFFWriteEncodedStrip(poTiff, 0, oStrip.data(), static_cast<tmsize_t>(oStrip.size()));
-        TIFFClose(poTiff);
-        const OpenTif oFile(oName.GetName());
-        const std::unique_ptr<krv::datasources::IRasterIO> poIO(oFile->GetRasterIO({1}));
+        const TempFolder oFolder;
+        const std::string file = oFolder.File("strips.tif");
+        {
+            const TiffFile poTiff = NewTiff(file);
+            SetForm(poTiff.get(), {.mnWidth = oCase.width,
+                                   .mnHeight = oCase.height,
+                                   .mnCompression = oCase.compression,
+                                   .mnRows = oCase.rowsPerStrip});
+            WriteBlock(poTiff.get(), 0, Bytes(std::size_t{oCase.width} * oCase.rowsPerStrip));
+        }
+        const TifPointer oFile = OpenTif(file);
+        const IOPointer poIO(oFile->GetRasterIO({1}));
         SCOPED_TRACE(oCase.width);
         EXPECT_EQ(poIO->GetTileWidth(), oCase.width);
         EXPECT_LT(poIO->GetTileHeight(), oCase.height);

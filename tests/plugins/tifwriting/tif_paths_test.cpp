@@ -1,17 +1,15 @@
 // The rarer ways of writing: files of other programs, colour tables, lossy pixels, limits, several bitmaps at once.
 
-#include "datasources/interfaces/ioverviewmanager.h"
-#include "datasources/interfaces/irasterdataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/pct/pct.h"
 #include "gobs/raster/rasterinfo.h"
-#include "tests/plugins/tifwriting/writingsupport.h"
+#include "tests/plugins/tif/tifsupport.h"
+#include "tests/support/tiffwriter.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
-#include <tiffio.h>
 
 #include <algorithm>
 #include <cstring>
@@ -23,7 +21,10 @@ namespace
 using namespace krv::test;
 using krv::datasources::AuxiliaryData;
 
-// A file as libtiff writes it: 50 x 40 pixels in tiles or strips of 16 rows.
+constexpr std::uint32_t WIDTH = 50;
+constexpr std::uint32_t HEIGHT = 40;
+
+// A file as libtiff writes it, in tiles or strips of 16 rows.
 struct ForeignFile
 {
     const char* mpMode;
@@ -33,46 +34,19 @@ struct ForeignFile
     std::uint16_t mnPredictor;
     bool mbTiled;
     bool mbSeparate;
+
+    TiffForm GetForm() const
+    {
+        return {.mnWidth = WIDTH,
+                .mnHeight = HEIGHT,
+                .mnChannels = mnChannels,
+                .mnBits = mnBits,
+                .mnCompression = mnCompression,
+                .mnPredictor = mnPredictor,
+                .mbSeparate = mbSeparate,
+                .mnTileWidth = mbTiled ? 16u : 0};
+    }
 };
-
-constexpr std::uint32_t WIDTH = 50;
-constexpr std::uint32_t HEIGHT = 40;
-
-void SetForm(TIFF* poTiff, const ForeignFile& oForm, std::uint32_t nWidth, std::uint32_t nHeight)
-{
-    TIFFSetField(poTiff, TIFFTAG_IMAGEWIDTH, nWidth);
-    TIFFSetField(poTiff, TIFFTAG_IMAGELENGTH, nHeight);
-    TIFFSetField(poTiff, TIFFTAG_SAMPLESPERPIXEL, oForm.mnChannels);
-    TIFFSetField(poTiff, TIFFTAG_BITSPERSAMPLE, oForm.mnBits);
-    TIFFSetField(poTiff, TIFFTAG_COMPRESSION, oForm.mnCompression);
-    TIFFSetField(poTiff, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
-    TIFFSetField(poTiff, TIFFTAG_PLANARCONFIG, oForm.mbSeparate ? PLANARCONFIG_SEPARATE : PLANARCONFIG_CONTIG);
-    if (oForm.mnPredictor != 1)
-        TIFFSetField(poTiff, TIFFTAG_PREDICTOR, oForm.mnPredictor);
-    if (oForm.mbTiled)
-    {
-        TIFFSetField(poTiff, TIFFTAG_TILEWIDTH, 16);
-        TIFFSetField(poTiff, TIFFTAG_TILELENGTH, 16);
-    }
-    else
-        TIFFSetField(poTiff, TIFFTAG_ROWSPERSTRIP, 16);
-}
-
-// Blocks whose stored bytes count upwards.
-void WriteBlocks(TIFF* poTiff, bool bTiled)
-{
-    Bytes oBlock(static_cast<std::size_t>(bTiled ? TIFFTileSize(poTiff) : TIFFStripSize(poTiff)));
-    const std::uint32_t nBlocks = bTiled ? TIFFNumberOfTiles(poTiff) : TIFFNumberOfStrips(poTiff);
-    for (std::uint32_t nBlock = 0; nBlock < nBlocks; ++nBlock)
-    {
-        for (std::size_t nAt = 0; nAt < oBlock.size(); ++nAt)
-            oBlock[nAt] = static_cast<unsigned char>(nAt + 7 * nBlock);
-        if (bTiled)
-            TIFFWriteEncodedTile(poTiff, nBlock, oBlock.data(), static_cast<tmsize_t>(oBlock.size()));
-        else
-            TIFFWriteEncodedStrip(poTiff, nBlock, oBlock.data(), static_cast<tmsize_t>(oBlock.size()));
-    }
-}
 
 TEST(TifPaths, FilesOfOtherProgramsAreUpdatedInTheirOwnForm)
 {
@@ -87,11 +61,11 @@ TEST(TifPaths, FilesOfOtherProgramsAreUpdatedInTheirOwnForm)
     {
         SCOPED_TRACE(std::string(oForm.mpMode) + " " + std::to_string(oForm.mnBits) + " bits, compression " +
                      std::to_string(oForm.mnCompression));
-        TIFF* const poTiff = TIFFOpen(fileName.c_str(), oForm.mpMode);
-        SetForm(poTiff, oForm, WIDTH, HEIGHT);
-        WriteBlocks(poTiff, oForm.mbTiled);
-        TIFFClose(poTiff);
-
+        {
+            const TiffFile poTiff = NewTiff(fileName, oForm.mpMode);
+            SetForm(poTiff.get(), oForm.GetForm());
+            WriteBlocks(poTiff.get());
+        }
         TifPointer poDataset = OpenTif(fileName, eUpdate);
         Bytes oExpected = ReadAll(*poDataset);
         const std::size_t nPixel = PixelBytes(*poDataset), nValue = nPixel / oForm.mnChannels;
@@ -103,8 +77,7 @@ TEST(TifPaths, FilesOfOtherProgramsAreUpdatedInTheirOwnForm)
         for (unsigned int nRow = 0; nRow < H; ++nRow)
             std::memcpy(&oExpected[((Y + nRow) * WIDTH + X) * nPixel], &oWindow[nRow * W * nPixel], W * nPixel);
         {
-            const std::unique_ptr<krv::datasources::IRasterIO> poIO(
-                poDataset->GetRasterIO(AllChannels(oForm.mnChannels)));
+            const IOPointer poIO(poDataset->GetRasterIO(AllChannels(oForm.mnChannels)));
             poIO->WriteWindow(X, Y, W, H, oWindow.data());
         }
         EXPECT_TRUE(ReadAll(*poDataset) == oExpected);
@@ -125,34 +98,34 @@ TEST(TifPaths, PagesBelowTheFirstAndTagsThatNobodyAskedAboutStay)
 {
     const TempFolder oFolder;
     const std::string fileName = oFolder.File("below.tif");
-    constexpr ForeignFile FORM{"w", 1, 8, COMPRESSION_LZW, 1, true, false};
     constexpr std::uint32_t MADE_UP = 65001;
     const TIFFFieldInfo oField = {MADE_UP, -1, -1, TIFF_DOUBLE, FIELD_CUSTOM, 1, 1, const_cast<char*>("MadeUp")};
     double aValues[92];
     for (int n = 0; n < 92; ++n)
         aValues[n] = n * 0.1;
-    TIFF* const poTiff = TIFFOpen(fileName.c_str(), FORM.mpMode);
-    TIFFMergeFieldInfo(poTiff, &oField, 1);
-    SetForm(poTiff, FORM, WIDTH, HEIGHT);
-    toff_t aBelow[1] = {0};
-    TIFFSetField(poTiff, TIFFTAG_SUBIFD, 1, aBelow);
-    TIFFSetField(poTiff, MADE_UP, 92, aValues);
-    WriteBlocks(poTiff, true);
-    TIFFWriteDirectory(poTiff);
-    SetForm(poTiff, FORM, WIDTH / 2, HEIGHT / 2);
-    TIFFSetField(poTiff, TIFFTAG_SUBFILETYPE, FILETYPE_REDUCEDIMAGE);
-    WriteBlocks(poTiff, true);
-    TIFFClose(poTiff);
+    {
+        const TiffFile poTiff = NewTiff(fileName);
+        TIFFMergeFieldInfo(poTiff.get(), &oField, 1);
+        TiffForm oForm{.mnWidth = WIDTH, .mnHeight = HEIGHT, .mnCompression = COMPRESSION_LZW, .mnTileWidth = 16};
+        SetForm(poTiff.get(), oForm);
+        toff_t aBelow[1] = {0};
+        TIFFSetField(poTiff.get(), TIFFTAG_SUBIFD, 1, aBelow);
+        TIFFSetField(poTiff.get(), MADE_UP, 92, aValues);
+        WriteBlocks(poTiff.get());
+        TIFFWriteDirectory(poTiff.get());
+        oForm.mnWidth /= 2;
+        oForm.mnHeight /= 2;
+        SetForm(poTiff.get(), oForm);
+        TIFFSetField(poTiff.get(), TIFFTAG_SUBFILETYPE, FILETYPE_REDUCEDIMAGE);
+        WriteBlocks(poTiff.get());
+    }
 
     TifPointer poDataset = OpenTif(fileName, eUpdate);
     std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poDataset->GetOverviewManager());
     ASSERT_EQ(poLevels->GetLevels(), std::vector<unsigned int>{2});
     const Bytes oPixels(WIDTH * HEIGHT, 9), oLevel(WIDTH / 2 * HEIGHT / 2, 8);
     WriteAll(*poDataset, oPixels);
-    {
-        const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(2, {1}));
-        WriteAll(*poIO, 1, oLevel);
-    }
+    WriteAll(*IOPointer(poLevels->GetOverviewIO(2, {1})), 1, oLevel);
     poLevels->SetValid(1, 2, true);
     AuxiliaryData oRecord = poDataset->ReadAuxiliaryData();
     const std::string polynomials = [&aValues]
@@ -178,21 +151,18 @@ TEST(TifPaths, PagesBelowTheFirstAndTagsThatNobodyAskedAboutStay)
     EXPECT_EQ(poRead->ReadAuxiliaryData().GetFileMetadata(), oRecord.GetFileMetadata());
     poLevels.reset(poRead->GetOverviewManager());
     EXPECT_TRUE(poLevels->IsValid(1, 2));
-    const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(2, {1}));
-    EXPECT_TRUE(ReadAll(*poIO, 1) == oLevel);
+    EXPECT_TRUE(ReadAll(*IOPointer(poLevels->GetOverviewIO(2, {1})), 1) == oLevel);
     EXPECT_TRUE(Judge(fileName).moPixels == oPixels);
 
-    TIFF* const poAgain = TIFFOpen(fileName.c_str(), "r");
-    TIFFMergeFieldInfo(poAgain, &oField, 1);
-    std::uint16_t nCount = 0;
+    const TiffFile poAgain(TIFFOpen(fileName.c_str(), "r"));
+    std::uint32_t nValues = 0; // of a tag that libtiff does not know
+    std::uint16_t nBelow = 0;
     const double* pValues = nullptr;
-    ASSERT_EQ(TIFFSetDirectory(poAgain, 0), 1);
-    ASSERT_EQ(TIFFGetField(poAgain, MADE_UP, &nCount, &pValues), 1);
-    EXPECT_TRUE(nCount == 92 && std::equal(pValues, pValues + 92, aValues));
+    ASSERT_EQ(TIFFGetField(poAgain.get(), MADE_UP, &nValues, &pValues), 1);
+    EXPECT_TRUE(nValues == 92 && std::equal(pValues, pValues + 92, aValues));
     toff_t* pBelow = nullptr;
-    ASSERT_EQ(TIFFGetField(poAgain, TIFFTAG_SUBIFD, &nCount, &pBelow), 1);
-    EXPECT_EQ(TIFFSetSubDirectory(poAgain, *pBelow), 1);
-    TIFFClose(poAgain);
+    ASSERT_EQ(TIFFGetField(poAgain.get(), TIFFTAG_SUBIFD, &nBelow, &pBelow), 1);
+    EXPECT_EQ(TIFFSetSubDirectory(poAgain.get(), *pBelow), 1);
 }
 
 TEST(TifPaths, ColourTablesAreStoredChangedAndDeleted)
@@ -248,7 +218,7 @@ TEST(TifPaths, JpegIsWrittenAndUpdatedWithinItsLoss)
         poDataset->Close();
         poDataset = OpenTif(fileName, eUpdate);
         {
-            const std::unique_ptr<krv::datasources::IRasterIO> poIO(poDataset->GetRasterIO({1, 2, 3}));
+            const IOPointer poIO(poDataset->GetRasterIO({1, 2, 3}));
             Bytes oWindow(20 * 20 * 3, 128);
             poIO->WriteWindow(10u, 20u, 20u, 20u, oWindow.data());
         }
@@ -264,71 +234,6 @@ TEST(TifPaths, JpegIsWrittenAndUpdatedWithinItsLoss)
             nSum += std::abs(int{oRead[n]} - int{oPixels[n]});
         EXPECT_LT(nSum / static_cast<double>(oPixels.size()), 3.0);
     }
-}
-
-// Levels keep their pixels for the channels that stay.
-TEST(TifPaths, ChannelsComeAndGoWithLevelsAndBitmaps)
-{
-    const TempFolder oFolder;
-    for (const char* pOptions : {"COMPRESS=ZSTD", "INTERLEAVE=BAND TILED=NO"})
-    {
-        const std::string fileName = oFolder.File("levels.tif");
-        TifPointer poDataset = CreateTif(fileName, pOptions, 40, 30, 3, krv::gobs::eDT_8U);
-        std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poDataset->GetOverviewManager());
-        poLevels->CreateLevel(2);
-        const Bytes oLevel = MakePixels(20, 15, 3, krv::gobs::eDT_8U, 5);
-        {
-            const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(2, {1, 2, 3}));
-            WriteAll(*poIO, 3, oLevel);
-        }
-        for (const unsigned int nChannel : {1U, 2U, 3U})
-            poLevels->SetValid(nChannel, 2, true);
-        const unsigned int nBitmap = poDataset->CreateBitmap();
-        poLevels.reset();
-        poDataset->DeleteChannel(1);
-        poDataset->AddNewChannel(krv::gobs::RasterInfo(40, 30, 1, krv::gobs::eDT_8U));
-        poDataset->Close();
-        const TifPointer poRead = OpenTif(fileName);
-        EXPECT_EQ(poRead->GetBitmapList(), std::vector<unsigned int>{nBitmap});
-        poLevels.reset(poRead->GetOverviewManager());
-        ASSERT_EQ(poLevels->GetLevels(), std::vector<unsigned int>{2});
-        EXPECT_TRUE(poLevels->IsValid(2, 2));
-        EXPECT_FALSE(poLevels->IsValid(3, 2)) << "nothing was made of the new channel";
-        const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(2, {2}));
-        Bytes oExpected(20 * 15);
-        for (std::size_t n = 0; n < oExpected.size(); ++n)
-            oExpected[n] = oLevel[n * 3 + 2];
-        EXPECT_TRUE(ReadAll(*poIO, 1) == oExpected);
-        EXPECT_EQ(Judge(fileName).moComplaints + Judge(fileName, 1).moComplaints, "");
-    }
-}
-
-TEST(TifPaths, SeveralBitmapsAreWrittenTogether)
-{
-    const TempFolder oFolder;
-    const std::string fileName = oFolder.File("bits.tif");
-    TifPointer poDataset = CreateTif(fileName, "", 61, 43, 1, krv::gobs::eDT_8U);
-    const std::vector<unsigned int> oBitmaps = {poDataset->CreateBitmap(), poDataset->CreateBitmap(),
-                                                poDataset->CreateBitmap()};
-    Bytes oBits(61 * 43 * 2);
-    for (std::size_t n = 0; n < oBits.size(); ++n)
-        oBits[n] = n % 3 == 0 || n % 7 == 0;
-    {
-        const std::unique_ptr<krv::datasources::IRasterIO> poIO(poDataset->GetBitmapIO({oBitmaps[2], oBitmaps[0]}));
-        poIO->WriteWindow(0u, 0u, 61u, 43u, oBits.data());
-        // A part whose window begins outside the image: 3 x 2 pixels of it at (0, 1).
-        Bytes oWindow(10 * 10 * 2, 1);
-        poIO->WriteWindow(-4, -3, 10, 10, 2, 4, 5, 2, oWindow.data());
-        for (const unsigned int nRow : {1U, 2U})
-            std::fill_n(oBits.begin() + nRow * 61 * 2, 3 * 2, static_cast<unsigned char>(1));
-        EXPECT_THROW(poIO->WriteWindow(0u, 1u, 61u, 43u, oBits.data()), krv::DataException);
-    }
-    poDataset->Close();
-    const TifPointer poRead = OpenTif(fileName);
-    const std::unique_ptr<krv::datasources::IRasterIO> poIO(poRead->GetBitmapIO({oBitmaps[2], oBitmaps[0]}));
-    EXPECT_TRUE(ReadAll(*poIO, 2) == oBits);
-    const std::unique_ptr<krv::datasources::IRasterIO> poUntouched(poRead->GetBitmapIO({oBitmaps[1]}));
-    EXPECT_TRUE(ReadAll(*poUntouched, 1) == Bytes(61 * 43, 0));
 }
 
 // Directories and their values stand before all blocks, from the image to the smallest level; blocks the other way.
@@ -347,7 +252,7 @@ TEST(TifPaths, ACloudOptimisedFileIsInItsOrder)
             for (const unsigned int nLevel : {4U, 2U})
             {
                 poLevels->CreateLevel(nLevel);
-                const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(nLevel, {1, 2, 3}));
+                const IOPointer poIO(poLevels->GetOverviewIO(nLevel, {1, 2, 3}));
                 WriteAll(*poIO, 3, MakePixels(300 / nLevel, 200 / nLevel, 3, krv::gobs::eDT_8U, nLevel));
             }
             poDataset->SetBitmapDescription(poDataset->CreateBitmap(), "");

@@ -1,7 +1,6 @@
-#include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/raster/rasterinfo.h"
-#include "tests/plugins/tifwriting/writingsupport.h"
+#include "tests/plugins/tif/tifsupport.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/crsfactory.h"
 
@@ -57,7 +56,7 @@ TEST(TifUpdate, RandomWindowsOfRandomChannelsEqualAPlainImage)
                     for (std::size_t nAt = 0; nAt < oChannels.size(); ++nAt)
                         std::memcpy(&oModel[((nY + nRow) * 100 + nX + nColumn) * 6 + (oChannels[nAt] - 1) * 2],
                                     &oWindow[((nRow * nWidth + nColumn) * oChannels.size() + nAt) * 2], 2);
-            std::unique_ptr<krv::datasources::IRasterIO> poIO(poDataset->GetRasterIO(oChannels));
+            IOPointer poIO(poDataset->GetRasterIO(oChannels));
             poIO->WriteWindow(nX, nY, nWidth, nHeight, oWindow.data());
             if (oRandom() % 8 == 0)
                 poDataset->Synchronize();
@@ -139,16 +138,14 @@ constexpr WayOfWriting WAYS[] = {
          if (!poLevels->GetLevels().empty())
              poLevels->DeleteLevel(2);
          poLevels->CreateLevel(2);
-         const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(2, {1}));
-         WriteAll(*poIO, 1, Bytes(150 * 100, nState));
+         WriteAll(*IOPointer(poLevels->GetOverviewIO(2, {1})), 1, Bytes(150 * 100, nState));
      },
      [](auto& oDataset)
      {
          const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(oDataset.GetOverviewManager());
          if (poLevels->GetLevels().empty())
              return Bytes();
-         const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(2, {1}));
-         return ReadAll(*poIO, 1);
+         return ReadAll(*IOPointer(poLevels->GetOverviewIO(2, {1})), 1);
      }},
     {"bitmaps",
      [](auto& oDataset, unsigned char nState)
@@ -157,8 +154,7 @@ constexpr WayOfWriting WAYS[] = {
              oDataset.DeleteBitmap(nBitmap);
          const unsigned int nBitmap = oDataset.CreateBitmap();
          oDataset.SetBitmapDescription(nBitmap, std::to_string(nState));
-         const std::unique_ptr<krv::datasources::IRasterIO> poIO(oDataset.GetBitmapIO({nBitmap}));
-         WriteAll(*poIO, 1, Bytes(300 * 200, nState & 1));
+         WriteAll(*IOPointer(oDataset.GetBitmapIO({nBitmap})), 1, Bytes(300 * 200, nState & 1));
      },
      [](auto& oDataset)
      {
@@ -166,8 +162,7 @@ constexpr WayOfWriting WAYS[] = {
              return Bytes();
          const unsigned int nBitmap = oDataset.GetBitmapList().front();
          const auto nState = static_cast<unsigned char>(std::stoi(oDataset.GetBitmapDescription(nBitmap)));
-         const std::unique_ptr<krv::datasources::IRasterIO> poIO(oDataset.GetBitmapIO({nBitmap}));
-         Bytes oBits = ReadAll(*poIO, 1);
+         Bytes oBits = ReadAll(*IOPointer(oDataset.GetBitmapIO({nBitmap})), 1);
          for (unsigned char& nBit : oBits)
              nBit = nBit == (nState & 1) ? nState : static_cast<unsigned char>(nState + 1);
          return oBits;
@@ -449,10 +444,7 @@ TEST(TifUpdate, LevelsAreMadeWrittenMarkedAndDeleted)
         poLevels->CreateLevel(nLevel);
     EXPECT_THROW(poLevels->CreateLevel(4), krv::DataException);
     EXPECT_FALSE(poLevels->IsValid(1, 4));
-    {
-        const std::unique_ptr<krv::datasources::IRasterIO> poIO(poLevels->GetOverviewIO(4, {1, 2}));
-        WriteAll(*poIO, 4, oPixels);
-    }
+    WriteAll(*IOPointer(poLevels->GetOverviewIO(4, {1, 2})), 4, oPixels);
     poLevels->SetValid(1, 4, true);
     poLevels->SetValid(2, 4, true);
     poDataset->WriteAuxiliaryData(AuxiliaryData(2));
@@ -475,38 +467,45 @@ TEST(TifUpdate, LevelsAreMadeWrittenMarkedAndDeleted)
     EXPECT_EQ(poLevels->GetLevels(), (std::vector<unsigned int>{2, 4, 64}));
 }
 
-TEST(TifUpdate, BitmapsKeepTheirNumbers)
+TEST(TifUpdate, BitmapsKeepTheirNumbersAndAreWrittenTogether)
 {
     const TempFolder oFolder;
     const std::string fileName = oFolder.File("b.tif");
-    TifPointer poDataset = CreateTif(fileName, "COMPRESS=LZW", 77, 33, 1, krv::gobs::eDT_8U);
-    Bytes oBits(77 * 33);
-    for (std::size_t nAt = 0; nAt < oBits.size(); ++nAt)
-        oBits[nAt] = nAt % 3 == 0 || nAt % 7 == 0;
+    TifPointer poDataset = CreateTif(fileName, "COMPRESS=LZW", 61, 43, 1, krv::gobs::eDT_8U);
     for (unsigned int nBitmap = 1; nBitmap <= 3; ++nBitmap)
         EXPECT_EQ(poDataset->CreateBitmap(), nBitmap);
-    poDataset->SetBitmapDescription(2, "clouds");
+    poDataset->SetBitmapDescription(1, "clouds");
     poDataset->SetBitmapMetadata(3, {{"Kind", "water"}});
+    Bytes oBits(61 * 43 * 2);
+    for (std::size_t nAt = 0; nAt < oBits.size(); ++nAt)
+        oBits[nAt] = nAt % 3 == 0 || nAt % 7 == 0 ? 200 : 0;
     {
-        const std::unique_ptr<krv::datasources::IRasterIO> poIO(poDataset->GetBitmapIO({2}));
-        Bytes oAny = oBits;
-        for (unsigned char& nByte : oAny)
-            nByte *= 200;
-        WriteAll(*poIO, 1, oAny);
+        const IOPointer poIO(poDataset->GetBitmapIO({3, 1}));
+        poIO->WriteWindow(0u, 0u, 61u, 43u, oBits.data());
+        // A part whose window begins outside the image: 3 x 2 pixels of it at (0, 1).
+        Bytes oWindow(10 * 10 * 2, 1);
+        poIO->WriteWindow(-4, -3, 10, 10, 2, 4, 5, 2, oWindow.data());
+        EXPECT_THROW(poIO->WriteWindow(0u, 1u, 61u, 43u, oBits.data()), krv::DataException);
     }
     poDataset->Close();
-    EXPECT_TRUE(Judge(fileName, 2).moPixels == oBits);
+    for (const unsigned int nRow : {1U, 2U})
+        std::fill_n(oBits.begin() + nRow * 61 * 2, 3 * 2, static_cast<unsigned char>(1));
+    Bytes oFirst(61 * 43);
+    for (std::size_t nAt = 0; nAt < oBits.size(); ++nAt)
+        oFirst[nAt / 2] = oBits[nAt] = oBits[nAt] != 0; // the second of two stays
+    EXPECT_TRUE(Judge(fileName, 1).moPixels == oFirst);
     poDataset = OpenTif(fileName, eUpdate);
-    poDataset->DeleteBitmap(1);
+    EXPECT_TRUE(ReadAll(*IOPointer(poDataset->GetBitmapIO({2})), 1) == Bytes(61 * 43, 0));
+    poDataset->DeleteBitmap(2);
     poDataset->Close();
     const TifPointer poRead = OpenTif(fileName);
-    EXPECT_EQ(poRead->GetBitmapList(), (std::vector<unsigned int>{2, 3}));
-    EXPECT_EQ(poRead->GetBitmapDescription(2), "clouds");
+    EXPECT_EQ(poRead->GetBitmapList(), (std::vector<unsigned int>{1, 3}));
+    EXPECT_EQ(poRead->GetBitmapDescription(1), "clouds");
     EXPECT_EQ(poRead->GetBitmapMetadata(3), (krv::datasources::MetadataMap{{"Kind", "water"}}));
-    const std::unique_ptr<krv::datasources::IRasterIO> poIO(poRead->GetBitmapIO({2}));
-    EXPECT_TRUE(ReadAll(*poIO, 1) == oBits);
+    EXPECT_TRUE(ReadAll(*IOPointer(poRead->GetBitmapIO({3, 1})), 2) == oBits);
 }
 
+// What the channels that stay have stays with them: pixels, levels, descriptions.
 TEST(TifUpdate, ChannelsAreAddedAndDeleted)
 {
     const TempFolder oFolder;
@@ -515,28 +514,42 @@ TEST(TifUpdate, ChannelsAreAddedAndDeleted)
         SCOPED_TRACE(pKind);
         const std::string fileName = oFolder.File("c.tif");
         const Bytes oPixels = MakePixels(80, 70, 3, krv::gobs::eDT_16U, 9);
+        const Bytes oLevel = MakePixels(40, 35, 3, krv::gobs::eDT_16U, 5);
         TifPointer poDataset = CreateTif(fileName, pKind, 80, 70, 3, krv::gobs::eDT_16U);
         WriteAll(*poDataset, oPixels);
         AuxiliaryData oData = poDataset->ReadAuxiliaryData();
         oData.SetChannelDescription("third", 3);
         poDataset->WriteAuxiliaryData(oData);
+        std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poDataset->GetOverviewManager());
+        poLevels->CreateLevel(2);
+        WriteAll(*IOPointer(poLevels->GetOverviewIO(2, {1, 2, 3})), 6, oLevel);
+        for (const unsigned int nChannel : {1U, 2U, 3U})
+            poLevels->SetValid(nChannel, 2, true);
+        const unsigned int nBitmap = poDataset->CreateBitmap();
         poDataset->Synchronize();
         EXPECT_THROW(poDataset->AddNewChannel(krv::gobs::RasterInfo(80, 70, 1, krv::gobs::eDT_32R)),
                      krv::DataException);
         poDataset->AddNewChannel(krv::gobs::RasterInfo(80, 70, 1, krv::gobs::eDT_16U));
         poDataset->DeleteChannel(2);
-        EXPECT_EQ(Judge(fileName).mnChannels, 3);
         poDataset->Close();
-        const Judgement oJudgement = Judge(fileName);
-        EXPECT_EQ(oJudgement.moComplaints, "");
-        Bytes oExpected(80 * 70 * 6, 0);
+        EXPECT_EQ(Judge(fileName).moComplaints + Judge(fileName, 1).moComplaints, "");
+        Bytes oExpected(80 * 70 * 6, 0), oThird(40 * 35 * 2);
         for (std::size_t nAt = 0; nAt < 80 * 70; ++nAt)
         {
             std::memcpy(&oExpected[nAt * 6], &oPixels[nAt * 6], 2);
             std::memcpy(&oExpected[nAt * 6 + 2], &oPixels[nAt * 6 + 4], 2);
         }
-        EXPECT_TRUE(oJudgement.moPixels == oExpected);
-        EXPECT_EQ(OpenTif(fileName)->ReadAuxiliaryData().GetChannelDescription(2), "third");
+        for (std::size_t nAt = 0; nAt < 40 * 35; ++nAt)
+            std::memcpy(&oThird[nAt * 2], &oLevel[nAt * 6 + 4], 2);
+        EXPECT_TRUE(Judge(fileName).moPixels == oExpected);
+        const TifPointer poRead = OpenTif(fileName);
+        EXPECT_EQ(poRead->ReadAuxiliaryData().GetChannelDescription(2), "third");
+        EXPECT_EQ(poRead->GetBitmapList(), std::vector<unsigned int>{nBitmap});
+        poLevels.reset(poRead->GetOverviewManager());
+        ASSERT_EQ(poLevels->GetLevels(), std::vector<unsigned int>{2});
+        EXPECT_TRUE(poLevels->IsValid(2, 2));
+        EXPECT_FALSE(poLevels->IsValid(3, 2)) << "nothing was made of the new channel";
+        EXPECT_TRUE(ReadAll(*IOPointer(poLevels->GetOverviewIO(2, {2})), 2) == oThird);
         std::filesystem::remove(fileName);
     }
 }

@@ -1,4 +1,4 @@
-#include "tests/plugins/tifwriting/writingsupport.h"
+#include "tests/plugins/tif/tifsupport.h"
 
 #include "datasources/interfaces/ichannelinfo.h"
 
@@ -121,13 +121,13 @@ std::size_t PixelBytes(const krv::plugins::tif::TifDataset& oDataset)
 
 Bytes ReadAll(krv::plugins::tif::TifDataset& oDataset)
 {
-    const std::unique_ptr<krv::datasources::IRasterIO> poIO(oDataset.GetRasterIO(AllChannels(oDataset.GetChanCount())));
+    const IOPointer poIO(oDataset.GetRasterIO(AllChannels(oDataset.GetChanCount())));
     return ReadAll(*poIO, PixelBytes(oDataset));
 }
 
 void WriteAll(krv::plugins::tif::TifDataset& oDataset, const Bytes& oPixels)
 {
-    const std::unique_ptr<krv::datasources::IRasterIO> poIO(oDataset.GetRasterIO(AllChannels(oDataset.GetChanCount())));
+    const IOPointer poIO(oDataset.GetRasterIO(AllChannels(oDataset.GetChanCount())));
     WriteAll(*poIO, PixelBytes(oDataset), oPixels);
 }
 

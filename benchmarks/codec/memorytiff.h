@@ -8,7 +8,7 @@
 #include <memory>
 #include <vector>
 
-namespace krv::test
+namespace krv::benchmarks
 {
 
 // A TIFF file in memory, for what is about the coding of blocks alone.
@@ -65,4 +65,4 @@ private:
     std::size_t mnPosition = 0;
 };
 
-} // namespace krv::test
+} // namespace krv::benchmarks
