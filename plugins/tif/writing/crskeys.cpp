@@ -4,6 +4,7 @@
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/crsfactory.h"
 
+#include <algorithm>
 #include <charconv>
 #include <cmath>
 #include <optional>
@@ -137,6 +138,32 @@ void SetBase(GeoKeyList& oKeys, const ICRS& oCRS)
         oKeys.Set(GeogSemiMinorAxisGeoKey, std::vector<double>{oCRS.GetSemiMajorAxis()});
 }
 
+// The way to WGS 84 that a bound system carries along: three shifts, or with rotations and scale seven numbers.
+void SetShift(GeoKeyList& oKeys, const ICRS& oCRS)
+{
+    const std::string definition = oCRS.GetWKT();
+    if (!definition.starts_with("BOUNDCRS["))
+        return;
+    constexpr std::string_view START = "TOWGS84[";
+    const std::string shift = FindElement(oCRS.GetWKT1(), "TOWGS84");
+    std::vector<double> oNumbers;
+    const char* const pEnd = shift.data() + shift.size();
+    for (const char* pAt = shift.data() + std::min(START.size(), shift.size()); pAt < pEnd; ++pAt)
+    {
+        double nNumber = 0;
+        const auto oResult = std::from_chars(pAt, pEnd, nNumber);
+        if (oResult.ec != std::errc())
+            return;
+        oNumbers.push_back(nNumber);
+        pAt = oResult.ptr;
+    }
+    if (oNumbers.size() != 7)
+        return;
+    if (definition.find("METHOD[\"Geocentric translations") != std::string::npos)
+        oNumbers.resize(3);
+    oKeys.Set(GeogTOWGS84GeoKey, oNumbers);
+}
+
 const ProjectionParameter* FindParameter(const std::vector<ProjectionParameter>& oParameters, const std::string& name)
 {
     for (const ProjectionParameter& oParameter : oParameters)
@@ -172,6 +199,7 @@ std::optional<GeoKeyList> ByParts(const ICRS& oCRS)
     SetModel(oKeys, oCRS);
     oKeys.Set(GTCitationGeoKey, oCRS.GetName());
     SetBase(oKeys, oCRS);
+    SetShift(oKeys, oCRS);
     SetUnits(oKeys, oCRS);
     SetHeights(oKeys, oCRS);
     if (!oCRS.IsProjected())

@@ -406,15 +406,21 @@ TEST(TifUpdate, GeocodingAndReferenceSystemsComeBack)
     const std::string fileName = oFolder.File("g.tif");
     const auto poUtm = krv::ogc::cs::CreateCRSFromEPSG(32632);
     const auto poFeet = krv::ogc::cs::CreateCRSFromEPSG(2263);
-    const auto poOwn = krv::ogc::cs::CreateCRSFromWKT(
-        "PROJCS[\"own\",GEOGCS[\"g\",DATUM[\"d\",SPHEROID[\"s\",6378000,298.5]],PRIMEM[\"Greenwich\",0],"
-        "UNIT[\"degree\",0.0174532925199433]],PROJECTION[\"Transverse_Mercator\"],"
-        "PARAMETER[\"latitude_of_origin\",10],PARAMETER[\"central_meridian\",12],PARAMETER[\"scale_factor\",0.99],"
-        "PARAMETER[\"false_easting\",5],PARAMETER[\"false_northing\",6],UNIT[\"metre\",1]]");
+    const auto MakeOwn = [](const std::string& shift)
+    {
+        return krv::ogc::cs::CreateCRSFromWKT(
+            "PROJCS[\"own\",GEOGCS[\"g\",DATUM[\"d\",SPHEROID[\"s\",6378000,298.5]" + shift +
+            "],PRIMEM[\"Greenwich\",0],UNIT[\"degree\",0.0174532925199433]],PROJECTION[\"Transverse_Mercator\"],"
+            "PARAMETER[\"latitude_of_origin\",10],PARAMETER[\"central_meridian\",12],PARAMETER[\"scale_factor\",0.99],"
+            "PARAMETER[\"false_easting\",5],PARAMETER[\"false_northing\",6],UNIT[\"metre\",1]]");
+    };
+    const auto poOwn = MakeOwn("");
+    const auto poShifted = MakeOwn(",TOWGS84[598.1,73.7,418.2]");
+    const auto poTurned = MakeOwn(",TOWGS84[598.1,73.7,418.2,0.202,0.045,-2.455,6.7]");
     const GeocodingInfo oPlain(500000.25, 10.5, 0, 5400000.125, 0, -10.25);
     const GeocodingInfo oTurned(1, 0.5, 0.25, 2, 0.125, -0.5);
     const auto poWorld = krv::ogc::cs::CreateCRSFromEPSG(4326);
-    for (const auto* poCRS : {poUtm.get(), poFeet.get(), poOwn.get(), poWorld.get()})
+    for (const auto* poCRS : {poUtm.get(), poFeet.get(), poOwn.get(), poShifted.get(), poTurned.get(), poWorld.get()})
         for (const GeocodingInfo& oInfo : {oPlain, oTurned})
         {
             TifPointer poDataset = CreateTif(fileName, "", 30, 20, 1, krv::gobs::eDT_8U);
@@ -427,6 +433,8 @@ TEST(TifUpdate, GeocodingAndReferenceSystemsComeBack)
             ASSERT_TRUE(poBack);
             EXPECT_TRUE(poBack->IsEquivalent(*poCRS)) << poCRS->GetName();
             EXPECT_EQ(poBack->GetEPSG(), poCRS->GetEPSG());
+            // By keys that every program reads, not as text.
+            EXPECT_EQ(ReadFile(fileName).find("ESRI PE"), std::string::npos) << poCRS->GetName();
         }
 }
 
