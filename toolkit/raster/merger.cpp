@@ -15,11 +15,11 @@ namespace krv::raster
 namespace
 {
 
-constexpr std::size_t MAX_VECTOR = 32;
+constexpr std::size_t MAX_VECTOR = 64;
 // What a block of pixels takes, results and all between: it stays in the first-level cache.
 constexpr std::uint64_t BLOCK_BYTES = 20 * 1024;
 // Conversions of a block leave no rest behind their vectors.
-constexpr std::uint64_t BLOCK_STEP = 32;
+constexpr std::uint64_t BLOCK_STEP = 64;
 
 // The smallest type that holds the values of all sources; the target's own unless that is larger. Parts are brought
 // together in it, since small ones are moved in fewer steps, and then converted at once.
@@ -58,9 +58,10 @@ private:
         std::size_t mnSourceBytes = 0;         // of a pixel
         std::size_t mnParts = 0;
         std::size_t mnPartBytes = 0;
-        std::size_t mnBytes = 0; // of a pixel of the stream
-        std::size_t mnReach = 0; // bytes from the beginning of a period that its loads may touch
-        unsigned char* mpScratch = nullptr;
+        std::size_t mnBytes = 0;            // of a pixel of the stream
+        std::size_t mnReach = 0;            // bytes from the beginning of a period that its loads may touch
+        unsigned char* mpScratch = nullptr; // of a block, for what is converted
+        unsigned char* mpRest = nullptr;    // of a block, for pixels near whose end a load would reach too far
         const unsigned char* mpBlock = nullptr;
         std::uint64_t mnAvailable = 0; // bytes from mpBlock
     };
@@ -89,10 +90,12 @@ private:
     void MergeBlock(unsigned char* pTarget, std::size_t nPixels);
     std::size_t MergePeriods(detail::MergeLoop pMerge, unsigned char* pTarget, std::size_t nPixelBytes,
                              std::size_t nPixels);
+    void MergeRest(detail::MergeLoop pMerge, std::size_t nFirst, std::size_t nPixels);
     void MergePixels(std::size_t nFirst, std::size_t nPixels);
 
     const detail::Kernels& moKernels = detail::GetKernels();
     const std::size_t mnVector = moKernels.mnVectorBytes;
+    const std::size_t mnLoad = moKernels.mnLoadBytes;
     detail::Layout moTarget;
     std::size_t mnMeeting = 0;
     std::vector<Stream> moStreams;
@@ -199,7 +202,7 @@ void Merger::Plan::MakeVectors()
     for (const Term& oTerm : moTerms)
     {
         Stream& oStream = moStreams[oTerm.mnStream];
-        oStream.mnReach = std::max(oStream.mnReach, oTerm.mnOffset + detail::LOAD_BYTES);
+        oStream.mnReach = std::max(oStream.mnReach, oTerm.mnOffset + mnLoad);
         moVectorTerms.push_back({nullptr, mnPeriodPixels * oStream.mnBytes, oTerm.moShuffle});
     }
 }
@@ -223,7 +226,7 @@ void Merger::Plan::AddTerms(std::size_t nVector, std::size_t nStream)
         Term oTerm = {nStream, nFirst, {}};
         for (std::size_t nByte = 0; nByte < mnVector; ++nByte)
         {
-            const bool bInside = oFrom[nByte] - nFirst < detail::LOAD_BYTES;
+            const bool bInside = oFrom[nByte] - nFirst < mnLoad;
             oTerm.moShuffle[nByte] = bInside ? static_cast<unsigned char>(oFrom[nByte] - nFirst) : 0x80;
             if (bInside)
                 oFrom[nByte] = std::numeric_limits<std::size_t>::max();
@@ -241,16 +244,18 @@ void Merger::Plan::MakeScratch()
 
     const auto nAligned = [this](std::size_t nBytes) // and room for a load at the last byte
     {
-        return (mnBlockPixels * nBytes + detail::LOAD_BYTES + 63) / 64 * 64;
+        return (mnBlockPixels * nBytes + mnLoad + 63) / 64 * 64;
     };
     std::uint64_t nBytes = nAligned(mnMergedBytes);
     for (const Stream& oStream : moStreams)
-        nBytes += oStream.mpConvert != nullptr ? nAligned(oStream.mnBytes) : 0;
+        nBytes += nAligned(oStream.mnBytes) * (oStream.mpConvert != nullptr ? 2 : 1);
     mpoScratch = std::make_unique_for_overwrite<unsigned char[]>(nBytes);
     mpMerged = mpoScratch.get();
     unsigned char* pNext = mpMerged + nAligned(mnMergedBytes);
     for (Stream& oStream : moStreams)
     {
+        oStream.mpRest = pNext;
+        pNext += nAligned(oStream.mnBytes);
         if (oStream.mpConvert == nullptr)
             continue;
         oStream.mpScratch = pNext;
@@ -283,7 +288,10 @@ void Merger::Plan::MergeBlock(unsigned char* pTarget, std::size_t nPixels)
         nMerged = nDone = MergePeriods(pDirect, pTarget, mnTargetBytes, nPixels);
     else if (pPlain != nullptr)
         nMerged = MergePeriods(pPlain, mpMerged, mnMergedBytes, nPixels);
-    MergePixels(nMerged, nPixels);
+    if (pPlain != nullptr && nMerged < nPixels)
+        MergeRest(pPlain, nMerged, nPixels);
+    else
+        MergePixels(nMerged, nPixels);
     pFinish(mpMerged + nDone * mnMergedBytes, pTarget + nDone * mnTargetBytes, (nPixels - nDone) * moParts.size());
 }
 
@@ -299,7 +307,7 @@ void Merger::Plan::PrepareStreams(const std::vector<const unsigned char*>& oSour
             continue;
         oStream.mpConvert(oStream.mpBlock, oStream.mpScratch, nCount * oStream.mnParts);
         oStream.mpBlock = oStream.mpScratch;
-        oStream.mnAvailable = nCount * oStream.mnBytes + detail::LOAD_BYTES;
+        oStream.mnAvailable = nCount * oStream.mnBytes + mnLoad;
     }
 }
 
@@ -324,6 +332,21 @@ std::size_t Merger::Plan::MergePeriods(detail::MergeLoop pMerge, unsigned char* 
         pMerge(moVectorTerms.data() + moFirstTerms[nVector], moFirstTerms[nVector + 1] - moFirstTerms[nVector],
                pTarget + nVector * (nPeriodBytes / nVectors), nPeriodBytes, static_cast<std::size_t>(nPeriods));
     return static_cast<std::size_t>(nPeriods) * mnPeriodPixels;
+}
+
+// Copies what is left of the streams to where loads may reach beyond it, and merges whole periods of that.
+void Merger::Plan::MergeRest(detail::MergeLoop pMerge, std::size_t nFirst, std::size_t nPixels)
+{
+    const std::size_t nPeriods = (nPixels - nFirst + mnPeriodPixels - 1) / mnPeriodPixels;
+    for (Stream& oStream : moStreams)
+    {
+        if (oStream.mnReach == 0)
+            continue;
+        std::memcpy(oStream.mpRest, oStream.mpBlock + nFirst * oStream.mnBytes, (nPixels - nFirst) * oStream.mnBytes);
+        oStream.mpBlock = oStream.mpRest;
+        oStream.mnAvailable = mnBlockPixels * oStream.mnBytes + mnLoad;
+    }
+    MergePeriods(pMerge, mpMerged + nFirst * mnMergedBytes, mnMergedBytes, nPeriods * mnPeriodPixels);
 }
 
 void Merger::Plan::MergePixels(std::size_t nFirst, std::size_t nPixels)

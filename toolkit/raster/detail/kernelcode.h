@@ -86,10 +86,9 @@ inline std::size_t ConvertRounded([[maybe_unused]] const unsigned char* pSource,
 #ifdef __SSE4_1__
     if constexpr (std::is_floating_point_v<TSource> && std::is_integral_v<TTarget> && sizeof(TTarget) <= 4)
     {
-        constexpr std::size_t LANES = sizeof(Ints) / sizeof(TTarget);
+        constexpr std::size_t LANES = ROUNDED_VALUES<TTarget>;
         for (; i + LANES <= nCount; i += LANES)
-            StoreInts(pTarget + i * sizeof(TTarget),
-                      RoundedVector<TTarget>(reinterpret_cast<const TSource*>(pSource) + i));
+            StoreRounded<TTarget>(pTarget + i * sizeof(TTarget), reinterpret_cast<const TSource*>(pSource) + i);
     }
 #endif
     return i;
@@ -111,11 +110,13 @@ void Convert(const unsigned char* pSource, unsigned char* pTarget, std::size_t n
 
 #ifdef __SSE4_1__
 
-// The values of 16 bytes, converted and written; for the pairs that mixed files meet in, and without conversion.
+// Whether a vector's values are converted as they are written; the pairs that mixed files meet in.
 template <typename TSource, typename TTarget>
 inline constexpr bool CAN_STORE = std::is_same_v<TSource, TTarget>;
 template <>
 inline constexpr bool CAN_STORE<std::uint8_t, float> = true;
+template <>
+inline constexpr bool CAN_STORE<std::uint8_t, double> = true;
 template <>
 inline constexpr bool CAN_STORE<std::uint16_t, float> = true;
 template <>
@@ -127,25 +128,114 @@ inline constexpr bool CAN_STORE<std::int16_t, double> = true;
 template <>
 inline constexpr bool CAN_STORE<float, double> = true;
 
-#ifdef __AVX2__
+#if defined(__AVX512VBMI__)
+using MergeVector = __m512i;
+constexpr std::size_t LOAD_BYTES = 64;
+
+struct MergeShuffle
+{
+    __m512i moFrom;
+    __mmask64 mnPlaced;
+};
+
+inline MergeVector LoadTerm(const unsigned char* p)
+{
+    return _mm512_loadu_si512(p);
+}
+inline MergeShuffle LoadShuffle(const unsigned char* p)
+{
+    const __m512i oFrom = _mm512_loadu_si512(p);
+    return {oFrom, ~_mm512_movepi8_mask(oFrom)};
+}
+inline MergeVector AddTerm(MergeVector oResult, MergeVector oLoad, const MergeShuffle& oShuffle)
+{
+    return _mm512_mask_permutexvar_epi8(oResult, oShuffle.mnPlaced, oShuffle.moFrom, oLoad);
+}
+
+// The first values of a vector that fill one of the target.
+inline __m512i WideInts(__m512i o, std::uint8_t, float)
+{
+    return _mm512_cvtepu8_epi32(_mm512_castsi512_si128(o));
+}
+inline __m512i WideInts(__m512i o, std::uint16_t, float)
+{
+    return _mm512_cvtepu16_epi32(_mm512_castsi512_si256(o));
+}
+inline __m512i WideInts(__m512i o, std::int16_t, float)
+{
+    return _mm512_cvtepi16_epi32(_mm512_castsi512_si256(o));
+}
+inline __m256i WideInts(__m512i o, std::uint8_t, double)
+{
+    return _mm256_cvtepu8_epi32(_mm512_castsi512_si128(o));
+}
+inline __m256i WideInts(__m512i o, std::uint16_t, double)
+{
+    return _mm256_cvtepu16_epi32(_mm512_castsi512_si128(o));
+}
+inline __m256i WideInts(__m512i o, std::int16_t, double)
+{
+    return _mm256_cvtepi16_epi32(_mm512_castsi512_si128(o));
+}
+
+template <typename TSource>
+inline void StorePart(float* p, __m512i o)
+{
+    _mm512_storeu_ps(p, _mm512_cvtepi32_ps(WideInts(o, TSource(), float())));
+}
+template <typename TSource>
+inline void StorePart(double* p, __m512i o)
+{
+    if constexpr (std::is_same_v<TSource, float>)
+        _mm512_storeu_pd(p, _mm512_cvtps_pd(_mm256_castsi256_ps(_mm512_castsi512_si256(o))));
+    else
+        _mm512_storeu_pd(p, _mm512_cvtepi32_pd(WideInts(o, TSource(), double())));
+}
+
+template <typename TSource, typename TTarget>
+inline void StoreVector(unsigned char* pBytes, MergeVector o)
+{
+    auto* const pTarget = reinterpret_cast<TTarget*>(pBytes);
+    constexpr std::size_t VALUES = 64 / sizeof(TTarget);
+    constexpr std::size_t PARTS = sizeof(TTarget) / sizeof(TSource);
+    if constexpr (PARTS == 1)
+        _mm512_storeu_si512(pTarget, o);
+    else if constexpr (PARTS == 2)
+    {
+        StorePart<TSource>(pTarget, o);
+        StorePart<TSource>(pTarget + VALUES, _mm512_shuffle_i64x2(o, o, 0x0E));
+    }
+    else
+    {
+        // Eighths lie within the quarters of a vector.
+        constexpr std::size_t QUARTER = PARTS / 4;
+        const __m512i oQuarters[4] = {o, _mm512_shuffle_i64x2(o, o, 1), _mm512_shuffle_i64x2(o, o, 2),
+                                      _mm512_shuffle_i64x2(o, o, 3)};
+        for (std::size_t n = 0; n < 4; ++n)
+        {
+            StorePart<TSource>(pTarget + n * QUARTER * VALUES, oQuarters[n]);
+            if constexpr (QUARTER == 2)
+                StorePart<TSource>(pTarget + (n * QUARTER + 1) * VALUES, _mm512_bsrli_epi128(oQuarters[n], 8));
+        }
+    }
+}
+#elif defined(__AVX2__)
 using MergeVector = __m256i;
+using MergeShuffle = __m256i;
+constexpr std::size_t LOAD_BYTES = 16;
 
 // The same 16 bytes for both halves.
 inline MergeVector LoadTerm(const unsigned char* p)
 {
     return _mm256_broadcastsi128_si256(_mm_loadu_si128(reinterpret_cast<const __m128i*>(p)));
 }
-inline MergeVector LoadShuffle(const unsigned char* p)
+inline MergeShuffle LoadShuffle(const unsigned char* p)
 {
     return _mm256_loadu_si256(reinterpret_cast<const __m256i*>(p));
 }
-inline MergeVector Shuffle(MergeVector o, MergeVector oShuffle)
+inline MergeVector AddTerm(MergeVector oResult, MergeVector oLoad, const MergeShuffle& oShuffle)
 {
-    return _mm256_shuffle_epi8(o, oShuffle);
-}
-inline MergeVector Unite(MergeVector a, MergeVector b)
-{
-    return _mm256_or_si256(a, b);
+    return _mm256_or_si256(oResult, _mm256_shuffle_epi8(oLoad, oShuffle));
 }
 
 inline void StoreEight(float* p, __m256i o)
@@ -188,22 +278,20 @@ inline void StoreVector(unsigned char* pBytes, MergeVector o)
 }
 #else
 using MergeVector = __m128i;
+using MergeShuffle = __m128i;
+constexpr std::size_t LOAD_BYTES = 16;
 
 inline MergeVector LoadTerm(const unsigned char* p)
 {
     return _mm_loadu_si128(reinterpret_cast<const __m128i*>(p));
 }
-inline MergeVector LoadShuffle(const unsigned char* p)
+inline MergeShuffle LoadShuffle(const unsigned char* p)
 {
     return LoadTerm(p);
 }
-inline MergeVector Shuffle(MergeVector o, MergeVector oShuffle)
+inline MergeVector AddTerm(MergeVector oResult, MergeVector oLoad, const MergeShuffle& oShuffle)
 {
-    return _mm_shuffle_epi8(o, oShuffle);
-}
-inline MergeVector Unite(MergeVector a, MergeVector b)
-{
-    return _mm_or_si128(a, b);
+    return _mm_or_si128(oResult, _mm_shuffle_epi8(oLoad, oShuffle));
 }
 
 inline void StoreFour(float* p, __m128i o)
@@ -254,7 +342,7 @@ inline void MergeFew(const MergeTerm* pTerms, unsigned char* pTarget, std::size_
 {
     const unsigned char* pSources[N];
     std::size_t nSteps[N];
-    MergeVector oShuffles[N];
+    MergeShuffle oShuffles[N];
     for (std::size_t n = 0; n < N; ++n)
     {
         pSources[n] = pTerms[n].mpSource;
@@ -266,7 +354,7 @@ inline void MergeFew(const MergeTerm* pTerms, unsigned char* pTarget, std::size_
         MergeVector oResult = {};
         for (std::size_t n = 0; n < N; ++n)
         {
-            oResult = Unite(oResult, Shuffle(LoadTerm(pSources[n]), oShuffles[n]));
+            oResult = AddTerm(oResult, LoadTerm(pSources[n]), oShuffles[n]);
             pSources[n] += nSteps[n];
         }
         StoreVector<TSource, TTarget>(pTarget, oResult);
@@ -297,7 +385,7 @@ void Merge(const MergeTerm* pTerms, std::size_t nTerms, unsigned char* pTarget, 
         for (std::size_t n = 0; n < nTerms; ++n)
         {
             const MergeVector oLoad = LoadTerm(pTerms[n].mpSource + i * pTerms[n].mnPeriodBytes);
-            oResult = Unite(oResult, Shuffle(oLoad, LoadShuffle(pTerms[n].mpShuffle)));
+            oResult = AddTerm(oResult, oLoad, LoadShuffle(pTerms[n].mpShuffle));
         }
         StoreVector<TSource, TTarget>(pTarget + i * nPeriodBytes, oResult);
     }
@@ -306,6 +394,7 @@ void Merge(const MergeTerm* pTerms, std::size_t nTerms, unsigned char* pTarget, 
 constexpr std::size_t VECTOR_BYTES = sizeof(MergeVector);
 #else
 constexpr std::size_t VECTOR_BYTES = 16;
+constexpr std::size_t LOAD_BYTES = 16;
 #endif
 
 template <std::size_t NSource, std::size_t NTarget>
@@ -323,8 +412,10 @@ constexpr MergeLoop FindMerge()
 template <std::size_t... N>
 constexpr Kernels MakeKernels(std::index_sequence<N...>)
 {
-    return {
-        {Convert<N / PART_COUNT, N % PART_COUNT>...}, {FindMerge<N / PART_COUNT, N % PART_COUNT>()...}, VECTOR_BYTES};
+    return {{Convert<N / PART_COUNT, N % PART_COUNT>...},
+            {FindMerge<N / PART_COUNT, N % PART_COUNT>()...},
+            VECTOR_BYTES,
+            LOAD_BYTES};
 }
 
 constexpr Kernels KERNELS = MakeKernels(std::make_index_sequence<PART_COUNT * PART_COUNT>());

@@ -3,14 +3,26 @@
 namespace krv::raster::detail
 {
 
-const Kernels& GetKernels()
+namespace
+{
+
+const Kernels& ChooseKernels()
 {
 #if defined(__x86_64__)
-    static const Kernels& oKernels = __builtin_cpu_supports("avx2") ? GetAvx2Kernels() : GetBaselineKernels();
-    return oKernels;
-#else
-    return GetBaselineKernels();
+    if (RunsAvx512())
+        return GetAvx512Kernels();
+    if (RunsAvx2())
+        return GetAvx2Kernels();
 #endif
+    return GetBaselineKernels();
+}
+
+} // namespace
+
+const Kernels& GetKernels()
+{
+    static const Kernels& oKernels = ChooseKernels();
+    return oKernels;
 }
 
 } // namespace krv::raster::detail

@@ -17,15 +17,13 @@ inline constexpr std::array<std::size_t, PART_COUNT> PART_BYTES = {1, 1, 2, 2, 4
 // Packed values from one part type to another. Nothing need be aligned.
 using Converter = void (*)(const unsigned char* pSource, unsigned char* pTarget, std::size_t nCount);
 
-// What one load of 16 bytes gives to a vector of the kernels' own length.
+// What one load gives to a vector; both are of the kernels' own length.
 struct MergeTerm
 {
     const unsigned char* mpSource; // of the load, and of those of the periods after it
     std::size_t mnPeriodBytes;
     const unsigned char* mpShuffle; // for each byte of the vector its place in the load, or 0x80 for 0
 };
-
-inline constexpr std::size_t LOAD_BYTES = 16;
 
 // Makes nPeriods vectors, each the union of its terms, 0 without any, and writes their values, converted, nPeriodBytes
 // apart.
@@ -41,6 +39,7 @@ struct Kernels
     Pairs<Converter> moConverters;
     Pairs<MergeLoop> moMerges;     // null where values take a conversion of their own; without vectors everywhere
     std::size_t mnVectorBytes = 0; // of a merged vector
+    std::size_t mnLoadBytes = 0;   // of the load of a term
 
     Converter GetConverter(std::size_t nSource, std::size_t nTarget) const
     {
@@ -57,5 +56,10 @@ const Kernels& GetKernels();
 
 const Kernels& GetBaselineKernels();
 const Kernels& GetAvx2Kernels();
+const Kernels& GetAvx512Kernels();
+
+// Whether this processor, and its system, run them.
+bool RunsAvx2();
+bool RunsAvx512();
 
 } // namespace krv::raster::detail

@@ -16,6 +16,78 @@ namespace krv::raster::detail
 namespace
 {
 
+#if defined(__AVX512VBMI__)
+
+// These processors saturate by themselves, to unsigned integers on both sides once NaN and what lies below are 0.
+template <typename TTarget>
+inline __m512i IntsOf(__m512 o)
+{
+    if constexpr (!std::is_signed_v<TTarget>)
+        return _mm512_cvtps_epu32(_mm512_max_ps(o, _mm512_setzero_ps()));
+    constexpr auto MOST = static_cast<float>(std::numeric_limits<TTarget>::max());
+    const __mmask16 nNumbers = _mm512_cmp_ps_mask(o, o, _CMP_ORD_Q);
+    if constexpr (sizeof(TTarget) < 4)
+        return _mm512_maskz_cvtps_epi32(nNumbers, _mm512_min_ps(o, _mm512_set1_ps(MOST)));
+    const __mmask16 nAbove = _mm512_cmp_ps_mask(o, _mm512_set1_ps(MOST), _CMP_GE_OQ);
+    return _mm512_mask_mov_epi32(_mm512_maskz_cvtps_epi32(nNumbers, o), nAbove,
+                                 _mm512_set1_epi32(std::numeric_limits<int>::max()));
+}
+
+template <typename TTarget>
+inline __m256i IntsOf(__m512d o)
+{
+    if constexpr (!std::is_signed_v<TTarget>)
+        return _mm512_cvtpd_epu32(_mm512_max_pd(o, _mm512_setzero_pd()));
+    constexpr auto MOST = static_cast<double>(std::numeric_limits<TTarget>::max());
+    return _mm512_maskz_cvtpd_epi32(_mm512_cmp_pd_mask(o, o, _CMP_ORD_Q), _mm512_min_pd(o, _mm512_set1_pd(MOST)));
+}
+
+template <typename TTarget>
+inline __m512i LoadInts(const float* p)
+{
+    return IntsOf<TTarget>(_mm512_loadu_ps(p));
+}
+template <typename TTarget>
+inline __m512i LoadInts(const double* p)
+{
+    return _mm512_inserti64x4(_mm512_castsi256_si512(IntsOf<TTarget>(_mm512_loadu_pd(p))),
+                              IntsOf<TTarget>(_mm512_loadu_pd(p + 8)), 1);
+}
+
+inline __m128i Saturated(__m512i o, std::uint8_t)
+{
+    return _mm512_cvtusepi32_epi8(o);
+}
+inline __m128i Saturated(__m512i o, std::int8_t)
+{
+    return _mm512_cvtsepi32_epi8(o);
+}
+inline __m256i Saturated(__m512i o, std::uint16_t)
+{
+    return _mm512_cvtusepi32_epi16(o);
+}
+inline __m256i Saturated(__m512i o, std::int16_t)
+{
+    return _mm512_cvtsepi32_epi16(o);
+}
+
+template <typename TTarget>
+constexpr std::size_t ROUNDED_VALUES = 16;
+
+template <typename TTarget, typename TSource>
+inline void StoreRounded(unsigned char* pTarget, const TSource* pSource)
+{
+    const __m512i oInts = LoadInts<TTarget>(pSource);
+    if constexpr (sizeof(TTarget) == 4)
+        _mm512_storeu_si512(pTarget, oInts);
+    else if constexpr (sizeof(TTarget) == 2)
+        _mm256_storeu_si256(reinterpret_cast<__m256i*>(pTarget), Saturated(oInts, TTarget()));
+    else
+        _mm_storeu_si128(reinterpret_cast<__m128i*>(pTarget), Saturated(oInts, TTarget()));
+}
+
+#else
+
 #ifdef __AVX2__
 using Ints = __m256i;
 using Floats = __m256;
@@ -311,6 +383,9 @@ inline Ints IntsOf(const double* pSource)
                All(std::numeric_limits<int>::min()));
 }
 
+template <typename TTarget>
+constexpr std::size_t ROUNDED_VALUES = sizeof(Ints) / sizeof(TTarget);
+
 template <typename TTarget, typename TSource>
 inline Ints RoundedVector(const TSource* pSource)
 {
@@ -327,6 +402,14 @@ inline Ints RoundedVector(const TSource* pSource)
     else
         return InOrder4(Pack(oPair(0), oPair(2 * STEP), TTarget()));
 }
+
+template <typename TTarget, typename TSource>
+inline void StoreRounded(unsigned char* pTarget, const TSource* pSource)
+{
+    StoreInts(pTarget, RoundedVector<TTarget>(pSource));
+}
+
+#endif
 
 } // namespace
 

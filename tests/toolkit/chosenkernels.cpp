@@ -5,6 +5,10 @@ namespace krv::raster::detail
 
 const Kernels& GetKernels()
 {
+#if defined(KRV_TESTS_Avx2) && defined(__x86_64__)
+    if (RunsAvx2())
+        return GetAvx2Kernels();
+#endif
     return GetBaselineKernels();
 }
 
