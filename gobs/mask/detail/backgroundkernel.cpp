@@ -20,6 +20,17 @@ constexpr std::size_t GROUP = 16; // pixels
     return nChannels <= 4096 && nTests * BYTES_PER_TEST >= nChannels * nSampleSize;
 }
 
+#if defined(KRV_VECTOR_MASKS)
+bool RunsAvx512()
+{
+    static const bool bRuns = __builtin_cpu_supports("avx512f") && __builtin_cpu_supports("avx512bw") &&
+                              __builtin_cpu_supports("avx512dq") && __builtin_cpu_supports("avx512vl") &&
+                              __builtin_cpu_supports("avx512vbmi") && __builtin_cpu_supports("gfni") &&
+                              __builtin_cpu_supports("bmi2");
+    return bRuns;
+}
+#endif
+
 } // namespace
 
 template <class Sample>
@@ -75,10 +86,18 @@ std::size_t BackgroundKernel<Sample>::MarkVectors([[maybe_unused]] const unsigne
     const MarkPattern oPattern = {moValues.data(), mbNaN ? moNaNs.data() : nullptr,
                                   moUsed.data(),   moExpected.data(),
                                   mnChannels,      meRule == eAnyChannel};
-    const std::size_t nWide =
-        __builtin_cpu_supports("avx2") ? MarkByAvx2<Sample>(pPixels, nPixels, oPattern, pBits) : 0;
-    return nWide + MarkBySse<Sample>(pPixels + nWide * mnChannels * sizeof(Sample), nPixels - nWide, oPattern,
-                                     pBits + nWide / 8);
+    const std::size_t nPixelBytes = mnChannels * sizeof(Sample);
+    std::size_t nDone = 0;
+    const auto oMark = [&](auto Mark)
+    {
+        nDone += Mark(pPixels + nDone * nPixelBytes, nPixels - nDone, oPattern, pBits + nDone / 8);
+    };
+    if (RunsAvx512())
+        oMark(MarkByAvx512<Sample>);
+    if (__builtin_cpu_supports("avx2"))
+        oMark(MarkByAvx2<Sample>);
+    oMark(MarkBySse<Sample>);
+    return nDone;
 #else
     return 0;
 #endif

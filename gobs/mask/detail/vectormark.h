@@ -20,7 +20,7 @@ struct MarkPattern
     bool mbInvert; // a pixel is background when not all its bytes became zero
 };
 
-// Mark pixels as BackgroundKernel does; give the number that they took, all but fewer than 16 or 32.
+// Mark pixels as BackgroundKernel does; give the number that they took, all but fewer than 16, 32 or 64.
 template <class Sample>
 std::size_t MarkBySse(const unsigned char* pPixels, std::size_t nPixels, const MarkPattern& oPattern,
                       unsigned char* pBits);
@@ -28,5 +28,9 @@ std::size_t MarkBySse(const unsigned char* pPixels, std::size_t nPixels, const M
 template <class Sample>
 std::size_t MarkByAvx2(const unsigned char* pPixels, std::size_t nPixels, const MarkPattern& oPattern,
                        unsigned char* pBits);
+// Takes nothing of samples of two parts. Only for processors that have AVX-512 with VBMI, GFNI and BMI2.
+template <class Sample>
+std::size_t MarkByAvx512(const unsigned char* pPixels, std::size_t nPixels, const MarkPattern& oPattern,
+                         unsigned char* pBits);
 
 } // namespace krv::gobs::detail
