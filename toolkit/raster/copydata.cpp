@@ -3,6 +3,7 @@
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/raster/detail/layout.h"
 #include "toolkit/raster/detail/stridedmove.h"
+#include "toolkit/raster/merger.h"
 
 #include <algorithm>
 #include <string>
@@ -105,6 +106,13 @@ void CopyMixed(const SourceSide& oSource, Layout oFrom, const TargetSide& oTarge
     }
 }
 
+// A merger makes packed real values complex in one pass. Its making takes some microseconds.
+bool MergerPays(Layout oFrom, Layout oTo, std::uint64_t nValues)
+{
+    constexpr std::uint64_t LEAST_BYTES = std::uint64_t{64} << 10;
+    return oFrom.mnParts < oTo.mnParts && nValues >= LEAST_BYTES / (oFrom.ValueBytes() + oTo.ValueBytes());
+}
+
 } // namespace
 
 std::uint64_t BufferDataSize(BufferType eType, std::uint64_t nValues)
@@ -126,6 +134,10 @@ void CopyData(const void* pSource, BufferType eSource, std::uint64_t nSourceStri
         return;
     if (nChannels > 1 && nSourceStride == nChannels && nTargetStride == nChannels)
         return CopyData(pSource, eSource, 1, pTarget, eTarget, 1, nPixels * nChannels);
+
+    if (nChannels == 1 && nSourceStride == 1 && nTargetStride == 1 && MergerPays(oFrom, oTo, nPixels))
+        return Merger({{eSource, 1}}, eTarget, {{0, 0}})
+            .Run({static_cast<const unsigned char*>(pSource)}, static_cast<unsigned char*>(pTarget), nPixels);
 
     const SourceSide oSource{static_cast<const unsigned char*>(pSource), oFrom.mnPart, nSourceStride * oFrom.mnParts};
     const TargetSide oTarget{static_cast<unsigned char*>(pTarget), oTo.mnPart, nTargetStride * oTo.mnParts};
