@@ -157,6 +157,7 @@ TEST(Command, WrongUsageIsTwo)
     EXPECT_EQ(RunKrv({"info"}).code, 2);
     ExpectFailure(RunKrv({"info", "a", "--non\x1bsense"}), 2, {"--non\\x1bsense"});
     EXPECT_EQ(RunKrv({"view", "a", "b", "--size", "0"}).code, 2);
+    ExpectFailure(RunKrv({"view", "a", "b", "--size", "9", "--size", "8"}), 2, {"--size is given more than once"});
     EXPECT_EQ(RunKrv({"--help"}).code, 0);
     EXPECT_EQ(RunKrv({"--version"}).code, 0);
     const std::string scene = SceneFolder() + "/rgb.tif";

@@ -97,8 +97,15 @@ int RunApplication(int nArguments, char** pArguments)
     bool bVerbose = false;
     oApp.set_version_flag("--version", "krv " KRV_VERSION);
     oApp.add_flag("--verbose", bVerbose, "Errors also name the function, source file and line");
-    oApp.failure_message([](const CLI::App*, const CLI::Error& oError)
-                         { return "krv: " + OneLine(oError.what()) + "; `krv --help` explains\n"; });
+    oApp.failure_message(
+        [](const CLI::App*, const CLI::Error& oError)
+        {
+            std::string text = oError.what();
+            const std::size_t nTwice = text.find(": At Most 1 required but received");
+            if (nTwice != std::string::npos)
+                text.replace(nTwice, std::string::npos, " is given more than once");
+            return "krv: " + OneLine(text) + "; `krv --help` explains\n";
+        });
     oApp.require_subcommand(1);
     oApp.fallthrough();
     AddFormatsVerb(oApp, oSelection);
