@@ -107,6 +107,8 @@ std::vector<unsigned int> SourceFile::CheckChannels(const std::vector<unsigned i
     std::vector<unsigned int> oResult = oChannels;
     for (unsigned int i = 1; oChannels.empty() && i <= nCount; ++i)
         oResult.push_back(i);
+    if (oResult.empty())
+        throw krv::DataException(moName + ": the file holds no image");
     for (const unsigned int nChannel : oResult)
     {
         if (nChannel == 0 || nChannel > nCount)
