@@ -1,6 +1,7 @@
 // Measures reading through the library against the raw libraries underneath, in one process and interleaved rounds.
-//     krv_bench_reader FOLDER [--size N] [--only tiles|margins|windows|memory|threads|process]
-// FOLDER takes the scenes (some gigabytes at the full size of 8192) and keeps them for the next run.
+//     krv_bench_reader FOLDER [--size N] [--only tiles|margins|windows|memory|threads|process] [--match TEXT]
+// TEXT is looked for in what the scenes are called, such as "3x8U deflate". FOLDER takes the scenes (some gigabytes at
+// the full size of 8192) and keeps them for the next run.
 
 #include "benchmarks/reader/byhand.h"
 #include "benchmarks/support/arguments.h"
@@ -433,35 +434,38 @@ double GoalOf(const std::string& codec)
 
 void MeasureAll(const Settings& oSettings, const Arguments& oArguments)
 {
-    const auto oMake = [&](const SceneKind& oKind, const char* pCodec, unsigned int nTile)
+    const auto oMake = [&](const SceneKind& oKind, const std::string& codec, unsigned int nTile)
     {
-        return MakeScene(oSettings.moFolder, oKind, pCodec, nTile, oSettings.mnSize);
+        return MakeScene(oSettings.moFolder, oKind, codec, nTile, oSettings.mnSize);
     };
-    const char* const CODECS[] = {"none", "deflate", "lzw", "zstd"};
+    std::vector<std::pair<SceneKind, std::string>> oScenes;
+    for (const char* pCodec : {"none", "deflate", "lzw", "zstd"})
+        for (const SceneKind& oKind : KINDS)
+            if ((oKind.moName + " " + pCodec).find(oArguments.GetOption("match")) != std::string::npos)
+                oScenes.emplace_back(oKind, pCodec);
 
     if (oArguments.Wants("tiles"))
     {
         PrintHeading("Tiles, against straight code over the codec libraries");
-        for (const char* pCodec : CODECS)
-            for (const SceneKind& oKind : KINDS)
-                for (const unsigned int nTile : {256u, 512u})
-                    MeasureTiles(oMake(oKind, pCodec, nTile), GoalOf(pCodec));
+        for (const auto& [oKind, codec] : oScenes)
+            for (const unsigned int nTile : {256u, 512u})
+                MeasureTiles(oMake(oKind, codec, nTile), GoalOf(codec));
     }
     if (oArguments.Wants("margins"))
     {
         PrintHeading("Margins, per byte delivered against the same run without margins");
-        for (const char* pCodec : CODECS)
-            for (const SceneKind& oKind : KINDS)
-                for (const unsigned int nMargin : {8u, 32u})
-                    MeasureMargins(oMake(oKind, pCodec, 256), nMargin, std::strcmp(pCodec, "none") == 0 ? 0.6 : 0.95);
+        for (const auto& [oKind, codec] : oScenes)
+            for (const unsigned int nMargin : {8u, 32u})
+                MeasureMargins(oMake(oKind, codec, 256), nMargin, codec == "none" ? 0.6 : 0.95);
     }
     if (oArguments.Wants("windows"))
     {
         PrintHeading("1,000 random windows of 300 x 300");
-        MeasureWindowsOfMapping(oMake(KINDS[0], "none", 256));
-        MeasureWindowsOfMapping(oMake(KINDS[1], "none", 256));
-        MeasureWindowsOfLibtiff(oMake(KINDS[0], "deflate", 256));
-        MeasureWindowsOfLibtiff(oMake(KINDS[1], "deflate", 256));
+        for (const auto& [oKind, codec] : oScenes)
+            if (!oKind.mbReal && codec == "none")
+                MeasureWindowsOfMapping(oMake(oKind, codec, 256));
+            else if (!oKind.mbReal && codec == "deflate")
+                MeasureWindowsOfLibtiff(oMake(oKind, codec, 256));
     }
     if (oArguments.Wants("memory"))
     {
@@ -471,8 +475,9 @@ void MeasureAll(const Settings& oSettings, const Arguments& oArguments)
     if (oArguments.Wants("threads"))
     {
         PrintHeading("Threads");
-        for (const char* pCodec : CODECS)
-            MeasureTwoThreads(oMake(KINDS[0], pCodec, 256));
+        for (const auto& [oKind, codec] : oScenes)
+            if (oKind.mnChannels == 3)
+                MeasureTwoThreads(oMake(oKind, codec, 256));
     }
     if (oArguments.Wants("process"))
     {
@@ -489,7 +494,8 @@ int main(int nArguments, char** pArguments)
     if (nArguments == 4 && std::strcmp(pArguments[1], "--child") == 0)
         return BeChild(pArguments[2], pArguments[3]);
     const Arguments oArguments(nArguments, pArguments,
-                               "FOLDER [--size N] [--only tiles|margins|windows|memory|threads|process]");
+                               "FOLDER [--size N] [--only tiles|margins|windows|memory|threads|process] "
+                               "[--match TEXT]");
     const Settings oSettings{oArguments.GetWords().front(), oArguments.GetNumber("size", 8192),
                              std::filesystem::read_symlink("/proc/self/exe").string()};
     std::filesystem::create_directories(oSettings.moFolder);
