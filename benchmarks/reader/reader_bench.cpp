@@ -128,10 +128,11 @@ void MeasureTiles(const SceneFile& oScene, double nGoal)
                  Number(oTimes[2] / oTimes[0]));
 }
 
-// Bytes a second with the margin against the same pass without one.
+// Bytes a second with the margin against the same pass without one. Over all of the image: a part of it needs a row of
+// tiles more than it has.
 void MeasureMargins(const SceneFile& oScene, unsigned int nMargin, double nGoal)
 {
-    const unsigned int nTiles = TilesOfPass(oScene);
+    const unsigned int nTiles = oScene.TilesAcross() * oScene.TilesAcross();
     const auto oPlain = OpenScene(oScene);
     const auto oMargins = OpenScene(oScene);
     oMargins->SetMargins(nMargin, nMargin, eMirror);
