@@ -2,6 +2,7 @@
 #include "tests/support/recipe.h"
 #include "tests/support/syntheticdataset.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "tools/krv/checksums.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/nodatamatch.h"
 #include "tools/krv/progress.h"
@@ -11,6 +12,7 @@
 #include "tools/krv/verbs/verbs.h"
 
 #include <gtest/gtest.h>
+#include <zlib.h>
 
 #include <cmath>
 #include <cstring>
@@ -146,6 +148,32 @@ struct Image
     std::shared_ptr<ImageModel> poModel;
     std::unique_ptr<SyntheticDataset> poDataset;
 };
+
+TEST(Checksums, AreThoseOfTheRowMajorPixelsWhateverTheTiles)
+{
+    for (const auto eType : {krv::gobs::eDT_8U, krv::gobs::eDT_16S, krv::gobs::eDT_32R, krv::gobs::eDT_64R,
+                             krv::gobs::eDT_C16S, krv::gobs::eDT_C64R})
+    {
+        for (const unsigned int nChannels : {1U, 2U, 3U, 4U, 5U})
+        {
+            const Image oImage(nChannels, eType);
+            for (const auto& [nTileWidth, nTileHeight] : {std::pair{8U, 6U}, {21U, 4U}, {1U, 1U}, {64U, 64U}})
+            {
+                BasicReader oReader(oImage.Get(), {}, false);
+                oReader.SetTileSize(nTileWidth, nTileHeight);
+                Progress oProgress("test", 1);
+                const auto oSums = ComputeChecksums(oReader, oProgress);
+                for (unsigned int c = 1; c <= nChannels; ++c)
+                {
+                    const std::string bytes = krv::test::RecipeImage(21, 17, {c}, eType);
+                    EXPECT_EQ(oSums.at(c - 1),
+                              crc32(0, reinterpret_cast<const Bytef*>(bytes.data()), static_cast<uInt>(bytes.size())))
+                        << "type " << eType << ", channel " << c << " of " << nChannels << ", tile " << nTileWidth;
+                }
+            }
+        }
+    }
+}
 
 // The mean over each target pixel's source pixels, one by one.
 double NaiveMean(const std::string& bytes, unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight)

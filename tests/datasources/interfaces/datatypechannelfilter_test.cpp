@@ -84,9 +84,23 @@ TEST(DataTypeChannelFilter, ADerivedRuleDecidesAndFailuresPass)
     EXPECT_TRUE(DataTypeChannelFilter(oCopy).Accept(oDataset, 1));
 }
 
-// Compiled plug-ins have these numbers in them.
-TEST(Interfaces, FlagsKeepTheirValues)
+TEST(AccessCapabilities, ThreeIndependentFlags)
 {
+    for (unsigned int nBits = 0; nBits < 8; ++nBits)
+    {
+        AccessCapabilities oTarget;
+        oTarget.Copy(AccessCapabilities((nBits & 1) != 0, (nBits & 2) != 0, (nBits & 4) != 0));
+        EXPECT_EQ(oTarget.IsReadable() + 2u * oTarget.IsWritable() + 4u * oTarget.IsUpdatable(), nBits);
+    }
+}
+
+TEST(FileFormat, CopiesBothMembersAndFlagsKeepTheirValues)
+{
+    krv::test::SimpleFormat oFirst("FIRST");
+    const krv::test::SimpleFormat oSecond("SECOND");
+    oFirst.Assignment(oSecond);
+    EXPECT_EQ(oFirst.GetShortName(), "SECOND");
+    EXPECT_EQ(krv::test::SimpleFormat(oFirst).GetExtensions(), std::vector<std::string>{"test"});
     EXPECT_EQ(eReadOnly, 0);
     EXPECT_EQ(eUpdate, 1);
     EXPECT_EQ(eDone, 0);

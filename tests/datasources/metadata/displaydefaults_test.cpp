@@ -175,7 +175,8 @@ TEST(DisplayDefaultTransformations, TheRecordKeepsItsChannelsAndIsFlagged)
 
     krv::qrfutils::AuxDataDefaultRGBGTfm oTfm({});
     oTfm = krv::qrfutils::AuxDataDefaultRGBGTfm(std::vector<unsigned int>{3}); // shares the mapper
-    const AuxiliaryData oResult = oTfm.Transform(oData);
+    const krv::qrfutils::AuxDataDefaultRGBGTfm oCopy(oTfm);
+    const AuxiliaryData oResult = oCopy.Transform(oData);
     EXPECT_EQ(oResult.GetFileMetadataValue("DefaultRed"), "1");
     EXPECT_EQ(oResult.GetChanMetadataValue("DefaultRed", 1), "3");
     EXPECT_EQ(oResult.GetChannelDescription(2), "near infrared");

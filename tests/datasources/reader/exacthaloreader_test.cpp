@@ -78,10 +78,19 @@ TEST_F(ExactHaloReaderTest, EveryWindowIsACropOfTheExtendedImage)
     }
 }
 
-TEST_F(ExactHaloReaderTest, RefusalsSayWhy)
+TEST_F(ExactHaloReaderTest, TilesOfAnySizeMakeUpTheImageAndRefusalsSayWhy)
 {
     ExactHaloReader oReader(new BasicReader(moFile, Channels{1, 2, 3}), true);
+    const ReferenceImage oImage = Image({1, 2, 3});
+    oReader.SetTileSize(5, 4);
     oReader.SetMargins(30, 2, eMirror); // wider than the image, which no other reader takes
+    ASSERT_EQ(oReader.GetTileCount(), 5u * 5u);
+    for (auto oTile = oReader.Begin(); oTile != oReader.End(); ++oTile)
+    {
+        const RasterPtr oRaster(*oTile);
+        ASSERT_EQ(PixelsOf(*oRaster), Crop(oImage, oRaster->GetX() - 30, oRaster->GetY() - 2, oRaster->GetWidth() + 60,
+                                           oRaster->GetHeight() + 4, eMirror, ""));
+    }
     const auto Read = [&](eMarginBehaviour eBehaviour)
     {
         oReader.SetMargins(1, 1, eBehaviour);

@@ -132,4 +132,11 @@ TYPED_TEST(StreamDecoder, ADecoderGoesOnAfterAFault)
     }
 }
 
+TEST(Status, EveryOneHasItsText)
+{
+    for (const Status oStatus : {Status::eDone, Status::eTruncated, Status::eCorrupt, Status::eNoMemory})
+        EXPECT_NE(std::string(), StatusText(oStatus));
+    EXPECT_STRNE(StatusText(Status::eTruncated), StatusText(Status::eCorrupt));
+}
+
 } // namespace

@@ -529,6 +529,7 @@ TEST(TifUpdate, ChannelsAreAddedAndDeleted)
         oData.SetChannelDescription("third", 3);
         poDataset->WriteAuxiliaryData(oData);
         std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poDataset->GetOverviewManager());
+        poLevels->CreateLevel(4); // nothing of it is ever stored
         poLevels->CreateLevel(2);
         WriteAll(*IOPointer(poLevels->GetOverviewIO(2, {1, 2, 3})), 6, oLevel);
         for (const unsigned int nChannel : {1U, 2U, 3U})
@@ -554,7 +555,7 @@ TEST(TifUpdate, ChannelsAreAddedAndDeleted)
         EXPECT_EQ(poRead->ReadAuxiliaryData().GetChannelDescription(2), "third");
         EXPECT_EQ(poRead->GetBitmapList(), std::vector<unsigned int>{nBitmap});
         poLevels.reset(poRead->GetOverviewManager());
-        ASSERT_EQ(poLevels->GetLevels(), std::vector<unsigned int>{2});
+        ASSERT_EQ(poLevels->GetLevels(), (std::vector<unsigned int>{2, 4}));
         EXPECT_TRUE(poLevels->IsValid(2, 2));
         EXPECT_FALSE(poLevels->IsValid(3, 2)) << "nothing was made of the new channel";
         EXPECT_TRUE(ReadAll(*IOPointer(poLevels->GetOverviewIO(2, {2})), 2) == oThird);
