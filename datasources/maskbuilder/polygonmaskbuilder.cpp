@@ -43,17 +43,25 @@ void PolygonMaskBuilder::SetClipRect(const GGLTIntRect<int>& oRect)
 
 krv::gobs::Mask* PolygonMaskBuilder::BuildMask(const krv::gobs::Raster& oRaster) const
 {
-    auto oMask = std::make_unique<krv::gobs::Mask>(oRaster.GetInfo(), oRaster.GetContext());
+    auto oMask =
+        std::make_unique<krv::gobs::Mask>(oRaster.GetInfo(), oRaster.GetContext(), krv::gobs::Mask::NotCleared());
+    detail::MaskRows oRows(*oMask, false);
     for (const GGLPolyRaster& oPolygon : moPolygons)
-        ApplyPolygon(*oMask, oPolygon);
+        Apply(oRows, oPolygon);
+    oRows.ClearRest();
     return oMask.release();
 }
 
 void PolygonMaskBuilder::ApplyPolygon(krv::gobs::Mask& oMask, const GGLPolyRaster& oPolygon) const
 {
+    detail::MaskRows oRows(oMask, true);
+    Apply(oRows, oPolygon);
+}
+
+void PolygonMaskBuilder::Apply(detail::MaskRows& oRows, const GGLPolyRaster& oPolygon) const
+{
     if (!oPolygon.IsNonEmpty())
         return;
-    const detail::MaskRows oRows(oMask);
     detail::PixelArea oArea = oRows.GetArea();
     if (moClip.x != 0 || moClip.y != 0 || moClip.width != 0 || moClip.height != 0)
     {

@@ -13,6 +13,11 @@ class GGLShape;
 namespace krv::datasources
 {
 
+namespace detail
+{
+class MaskRows;
+}
+
 // Makes masks from polygons in pixel coordinates of the file: a set bit lies in at least one of them. A row of a
 // polygon is filled between its crossings: the pair (s, e) sets the columns from trunc(s + 0.5) to trunc(e - 0.5),
 // those whose centres lie between the two, and always the first of them, intended: thin parts do not vanish. Every
@@ -42,6 +47,8 @@ protected:
     void ApplyPolygon(krv::gobs::Mask& oMask, const GGLPolyRaster& oPolygon) const;
 
 private:
+    void Apply(detail::MaskRows& oRows, const GGLPolyRaster& oPolygon) const;
+
     GGLTIntRect<int> moClip;
     std::vector<GGLPolyRaster> moPolygons;
 };

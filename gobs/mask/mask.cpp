@@ -141,11 +141,15 @@ std::uint64_t MaskBytes(const RasterInfo& oInfo, const RasterContext& oContext, 
 
 } // namespace
 
-Mask::Mask(const RasterInfo& oInfo, const RasterContext& oContext)
+Mask::Mask(const RasterInfo& oInfo, const RasterContext& oContext) : Mask(oInfo, oContext, NotCleared())
+{
+    std::memset(mpBits, 0, mnBitsSize);
+}
+
+Mask::Mask(const RasterInfo& oInfo, const RasterContext& oContext, NotCleared)
     : mnWidth(oInfo.GetWidth()), mnHeight(oInfo.GetHeight()), moContext(oContext),
       mnBitsSize(MaskBytes(oInfo, oContext, Place::Current())), mpBits(static_cast<unsigned char*>(HMalloc(mnBitsSize)))
 {
-    std::memset(mpBits, 0, mnBitsSize);
 }
 
 Mask::Mask(const RasterInfo& oInfo, const RasterContext& oContext, unsigned char* pBytes, bool bTakeOwnership)

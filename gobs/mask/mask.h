@@ -19,6 +19,12 @@ public:
     // All bits clear. Only width and height of the description count.
     Mask(const RasterInfo& oInfo, const RasterContext& oContext);
 
+    // The same with bits that have any value, for those who write every byte.
+    struct NotCleared
+    {
+    };
+    Mask(const RasterInfo& oInfo, const RasterContext& oContext, NotCleared);
+
     // Packs a byte per pixel of the full extent: any byte other than 0 sets the bit. With `bTakeOwnership` the buffer
     // came from HMalloc and is freed here, also when this throws; it is not kept in either case. Throws DataException
     // for a null buffer.

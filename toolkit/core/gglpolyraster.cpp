@@ -1,5 +1,6 @@
 #include "toolkit/core/gglpolyraster.h"
 
+#include "toolkit/core/detail/edgebatch.h"
 #include "toolkit/core/gglshape.h"
 #include "toolkit/exceptions/exceptions.h"
 
@@ -8,6 +9,8 @@
 #include <cmath>
 #include <iterator>
 #include <limits>
+
+using krv::core::detail::EdgeBatch;
 
 namespace
 {
@@ -85,57 +88,63 @@ GGLPolyRaster::~GGLPolyRaster() = default;
 
 void GGLPolyRaster::AddRing(const GDBVertex* poFirst, const GDBVertex* poEnd, const RowLimits& oLimits)
 {
-    // The first row whose centre is not above a vertex, one beyond the last row at most.
-    const auto nLowest = static_cast<double>(oLimits.first);
-    const auto nHighest = static_cast<double>(oLimits.last + 1);
-    const auto RowOf = [nLowest, nHighest](const GDBVertex& oVertex)
-    {
-        return std::min(std::max(std::ceil(oVertex.y - 0.5), nLowest), nHighest);
-    };
     if (poEnd - poFirst < 2)
         return;
     const std::size_t nEdges = moEdges.size();
+    EdgeBatch oBatch(oLimits.first, oLimits.last);
     const GDBVertex* poBefore = poEnd - 1;
-    double nBefore = RowOf(*poBefore);
-    // Most edges of fine outlines cross no row. Those that do are collected without a branch, then looked at.
-    std::array<const GDBVertex*, 512> oCrossing;
+    oBatch.Begin(*poBefore);
     for (const GDBVertex* poVertex = poFirst; poVertex != poEnd;)
     {
-        const GDBVertex* const poStop = poVertex + std::min<std::ptrdiff_t>(oCrossing.size(), poEnd - poVertex);
-        std::size_t nCount = 0;
-        for (; poVertex != poStop; ++poVertex)
+        const auto nCount = std::min<std::ptrdiff_t>(EdgeBatch::SIZE, poEnd - poVertex);
+        oBatch.Take(*poBefore, poVertex, static_cast<std::size_t>(nCount));
+        if (!oBatch.Compute())
         {
-            const double nRow = RowOf(*poVertex);
-            oCrossing[nCount] = poVertex;
-            nCount += nRow == nBefore ? 0 : 1;
-            nBefore = nRow;
+            moEdges.resize(nEdges);
+            return AddUnusual(poFirst, poEnd, oLimits);
         }
-        for (std::size_t i = 0; i < nCount; ++i)
-        {
-            const GDBVertex& oTo = *oCrossing[i];
-            const GDBVertex& oFrom = oCrossing[i] == poFirst ? *poBefore : *(oCrossing[i] - 1);
-            if (!IsUsable(oFrom) || !IsUsable(oTo))
-            {
-                moEdges.resize(nEdges);
-                AddUsable(poFirst, poEnd, oLimits);
-                return;
-            }
-            const auto nFrom = static_cast<std::int64_t>(RowOf(oFrom)), nTo = static_cast<std::int64_t>(RowOf(oTo));
-            // Downwards whatever the sense of the ring, so that neighbours agree on the edge between them.
-            if (nFrom < nTo)
-                AddEdge(oFrom, oTo, {nFrom, nTo - 1});
-            else
-                AddEdge(oTo, oFrom, {nTo, nFrom - 1});
-        }
+        AddBatch(oBatch);
+        poVertex += nCount;
+        poBefore = poVertex - 1;
     }
 }
 
-// The ring without the vertices that are not usable, of which there are some.
-void GGLPolyRaster::AddUsable(const GDBVertex* poFirst, const GDBVertex* poEnd, const RowLimits& oLimits)
+void GGLPolyRaster::AddBatch(const EdgeBatch& oBatch)
+{
+    const std::size_t nBegin = moEdges.size(), nCount = oBatch.GetCount();
+    moEdges.resize(nBegin + nCount);
+    int nFirstRow = moExtent.firstRow, nLastRow = moExtent.lastRow;
+    for (std::size_t i = 0; i < nCount; ++i)
+    {
+        const int nFirst = oBatch.GetFirstRow(i), nLast = oBatch.GetLastRow(i);
+        moEdges[nBegin + i] = {nFirst, nLast, oBatch.GetX(i), oBatch.GetSlope(i)};
+        nFirstRow = std::min(nFirstRow, nFirst);
+        nLastRow = std::max(nLastRow, nLast);
+    }
+    moExtent.firstRow = nFirstRow;
+    moExtent.lastRow = nLastRow;
+    moExtent.left = std::min(moExtent.left, oBatch.GetLeft());
+    moExtent.right = std::max(moExtent.right, oBatch.GetRight());
+}
+
+// A ring with vertices that are not usable, which are left out, or with enormous coordinates: edge by edge.
+void GGLPolyRaster::AddUnusual(const GDBVertex* poFirst, const GDBVertex* poEnd, const RowLimits& oLimits)
 {
     std::vector<GDBVertex> oUsable;
     std::copy_if(poFirst, poEnd, std::back_inserter(oUsable), IsUsable);
-    AddRing(oUsable.data(), oUsable.data() + oUsable.size(), oLimits);
+    const auto nLowest = static_cast<double>(oLimits.first);
+    const auto nHighest = static_cast<double>(oLimits.last + 1);
+    for (std::size_t i = 0; i < oUsable.size(); ++i)
+    {
+        const GDBVertex& oFrom = oUsable[i == 0 ? oUsable.size() - 1 : i - 1];
+        const GDBVertex& oTo = oUsable[i];
+        const auto nFrom = static_cast<std::int64_t>(std::clamp(std::ceil(oFrom.y - 0.5), nLowest, nHighest));
+        const auto nTo = static_cast<std::int64_t>(std::clamp(std::ceil(oTo.y - 0.5), nLowest, nHighest));
+        if (nFrom < nTo)
+            AddEdge(oFrom, oTo, {nFrom, nTo - 1});
+        else if (nTo < nFrom)
+            AddEdge(oTo, oFrom, {nTo, nFrom - 1});
+    }
 }
 
 void GGLPolyRaster::AddEdge(const GDBVertex& oUpper, const GDBVertex& oLower, const RowLimits& oRows)
@@ -145,10 +154,10 @@ void GGLPolyRaster::AddEdge(const GDBVertex& oUpper, const GDBVertex& oLower, co
     const auto [nLow, nHigh] = std::minmax({oUpper.x, oLower.x});
     const Edge oEdge(static_cast<int>(oRows.first), static_cast<int>(oRows.last), std::clamp(nX, nLow, nHigh), nSlope);
     const double nEnd = oEdge.At(oEdge.lastRow);
-    mnLeft = std::min({mnLeft, oEdge.x, nEnd});
-    mnRight = std::max({mnRight, oEdge.x, nEnd});
-    mnFirstRow = std::min(mnFirstRow, oEdge.firstRow);
-    mnLastRow = std::max(mnLastRow, oEdge.lastRow);
+    moExtent.left = std::min({moExtent.left, oEdge.x, nEnd});
+    moExtent.right = std::max({moExtent.right, oEdge.x, nEnd});
+    moExtent.firstRow = std::min(moExtent.firstRow, oEdge.firstRow);
+    moExtent.lastRow = std::max(moExtent.lastRow, oEdge.lastRow);
     moEdges.push_back(oEdge);
 }
 
@@ -156,18 +165,20 @@ void GGLPolyRaster::Finish()
 {
     if (moEdges.empty())
     {
-        mnFirstRow = 0;
-        mnLastRow = -1;
-        mnLeft = 0;
-        mnRight = 0;
+        moExtent = {0, -1, 0, 0};
         return;
     }
-    mnLeft = std::max(mnLeft, -GREATEST);
-    mnRight = std::min(mnRight, GREATEST);
+    moExtent.left = std::max(moExtent.left, -GREATEST);
+    moExtent.right = std::min(moExtent.right, GREATEST);
     SortEdges();
     moLastRows.emplace_back(BundleCount(moEdges.size()), std::numeric_limits<int>::min());
-    for (std::size_t i = 0; i < moEdges.size(); ++i)
-        moLastRows[0][i / BUNDLE] = std::max(moLastRows[0][i / BUNDLE], moEdges[i].lastRow);
+    for (std::size_t i = 0; i < moEdges.size(); i += BUNDLE)
+    {
+        int nLast = moEdges[i].lastRow;
+        for (std::size_t k = i + 1; k < std::min(i + BUNDLE, moEdges.size()); ++k)
+            nLast = std::max(nLast, moEdges[k].lastRow);
+        moLastRows[0][i / BUNDLE] = nLast;
+    }
     while (moLastRows.back().size() > 1)
     {
         const std::vector<int>& oBelow = moLastRows.back();
@@ -181,7 +192,7 @@ void GGLPolyRaster::Finish()
 // By counting where the rows are not many more than the edges, which is the rule.
 void GGLPolyRaster::SortEdges()
 {
-    const auto nRows = static_cast<std::uint64_t>(std::int64_t{mnLastRow} - mnFirstRow + 1);
+    const auto nRows = static_cast<std::uint64_t>(std::int64_t{moExtent.lastRow} - moExtent.firstRow + 1);
     if (nRows / 8 > moEdges.size() + 128)
     {
         std::sort(moEdges.begin(), moEdges.end(), [](const Edge& a, const Edge& b) { return a.firstRow < b.firstRow; });
@@ -189,7 +200,7 @@ void GGLPolyRaster::SortEdges()
     }
     const auto RowOf = [this](const Edge& oEdge)
     {
-        return static_cast<std::size_t>(std::int64_t{oEdge.firstRow} - mnFirstRow);
+        return static_cast<std::size_t>(std::int64_t{oEdge.firstRow} - moExtent.firstRow);
     };
     std::vector<std::size_t> oPlaces(static_cast<std::size_t>(nRows) + 1, 0);
     for (const Edge& oEdge : moEdges)
@@ -202,27 +213,29 @@ void GGLPolyRaster::SortEdges()
     moEdges.swap(oSorted);
 }
 
-void GGLPolyRaster::FindEdges(int nFirstRow, int nLastRow, std::vector<Edge>& oEdges) const
+std::size_t GGLPolyRaster::CountEdgesAbove(int nRow) const
+{
+    const auto oEnd = std::lower_bound(moEdges.begin(), moEdges.end(), nRow,
+                                       [](const Edge& oEdge, int nValue) { return oEdge.firstRow < nValue; });
+    return static_cast<std::size_t>(oEnd - moEdges.begin());
+}
+
+void GGLPolyRaster::FindReaching(int nRow, std::size_t nEdges, std::vector<const Edge*>& oEdges) const
 {
     oEdges.clear();
-    if (moEdges.empty())
-        return;
-    const auto oEnd = std::upper_bound(moEdges.begin(), moEdges.end(), nLastRow,
-                                       [](int nRow, const Edge& oEdge) { return nRow < oEdge.firstRow; });
-    const auto nEdges = static_cast<std::size_t>(oEnd - moEdges.begin());
-    // Depth first over the bundles that reach down to the first row; the number of a bundle's first member is its own
-    // times the size of a bundle.
+    // Depth first over the bundles that reach down to the row; the number of a bundle's first member is its own times
+    // the size of a bundle.
     const auto Visit = [&](const auto& oSelf, std::size_t nLevel, std::size_t nBundle) -> void
     {
-        if (moLastRows[nLevel][nBundle] < nFirstRow)
+        if (moLastRows[nLevel][nBundle] < nRow)
             return;
         const std::size_t nFirst = nBundle * BUNDLE;
         if (nLevel == 0)
         {
             for (std::size_t i = nFirst; i < std::min(nFirst + BUNDLE, nEdges); ++i)
             {
-                if (moEdges[i].lastRow >= nFirstRow)
-                    oEdges.push_back(moEdges[i]);
+                if (moEdges[i].lastRow >= nRow)
+                    oEdges.push_back(&moEdges[i]);
             }
             return;
         }
@@ -245,10 +258,12 @@ std::vector<double> GGLPolyRaster::GetScanline(int nRow) const
 
 void GGLPolyRaster::GetScanline(int nRow, std::vector<double>& oCrossings) const
 {
-    std::vector<Edge> oEdges;
-    FindEdges(nRow, nRow, oEdges);
     oCrossings.clear();
-    for (const Edge& oEdge : oEdges)
-        oCrossings.push_back(oEdge.At(nRow));
+    if (nRow > moExtent.lastRow)
+        return;
+    std::vector<const Edge*> oEdges;
+    FindReaching(nRow, CountEdgesAbove(nRow + 1), oEdges);
+    for (const Edge* poEdge : oEdges)
+        oCrossings.push_back(poEdge->At(nRow));
     std::sort(oCrossings.begin(), oCrossings.end());
 }

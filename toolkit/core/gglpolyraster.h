@@ -11,6 +11,11 @@
 
 class GGLShape;
 
+namespace krv::core::detail
+{
+class EdgeBatch;
+}
+
 // A polygon ready for scan conversion: filled even-odd, row by row. Row r is the line y = r + 0.5 through the centres
 // of the row's pixels; an edge belongs to the rows whose centres are at or below its upper end and above its lower one,
 // so every row has an even number of crossings. Rows are signed 32-bit numbers; what lies beyond them, and on the
@@ -52,11 +57,11 @@ public:
     // Whether any row has a crossing.
     bool IsNonEmpty() const { return !moEdges.empty(); }
     // The first and last row with crossings; 0 and -1 without any.
-    int GetFirstRow() const { return mnFirstRow; }
-    int GetLastRow() const { return mnLastRow; }
+    int GetFirstRow() const { return moExtent.firstRow; }
+    int GetLastRow() const { return moExtent.lastRow; }
     // All crossings lie between these, rounding aside.
-    double GetLeft() const { return mnLeft; }
-    double GetRight() const { return mnRight; }
+    double GetLeft() const { return moExtent.left; }
+    double GetRight() const { return moExtent.right; }
 
     // The crossings of a row, ascending, in pairs that enclose what is inside; empty for a row without any. Takes time
     // in proportion to their number, but for the logarithms of search and sort.
@@ -64,8 +69,12 @@ public:
     // The same into a vector that is used again.
     void GetScanline(int nRow, std::vector<double>& oCrossings) const;
 
-    // Replaces the list by the edges that cross a row from nFirstRow to nLastRow, by their first row.
-    void FindEdges(int nFirstRow, int nLastRow, std::vector<Edge>& oEdges) const;
+    // All edges, by their first row.
+    const std::vector<Edge>& GetEdges() const { return moEdges; }
+    // The number of edges that begin above a row.
+    std::size_t CountEdgesAbove(int nRow) const;
+    // Replaces the list by those of the first nEdges edges that reach down to a row.
+    void FindReaching(int nRow, std::size_t nEdges, std::vector<const Edge*>& oEdges) const;
 
 private:
     struct RowLimits
@@ -74,8 +83,18 @@ private:
         std::int64_t last = std::numeric_limits<int>::max() - 1; // so that a loop over rows can end
     };
 
+    // Where the crossings are.
+    struct Extent
+    {
+        int firstRow = std::numeric_limits<int>::max();
+        int lastRow = std::numeric_limits<int>::min();
+        double left = std::numeric_limits<double>::max();
+        double right = std::numeric_limits<double>::lowest();
+    };
+
     void AddRing(const GDBVertex* poFirst, const GDBVertex* poEnd, const RowLimits& oLimits);
-    void AddUsable(const GDBVertex* poFirst, const GDBVertex* poEnd, const RowLimits& oLimits);
+    void AddBatch(const krv::core::detail::EdgeBatch& oBatch);
+    void AddUnusual(const GDBVertex* poFirst, const GDBVertex* poEnd, const RowLimits& oLimits);
     void AddEdge(const GDBVertex& oUpper, const GDBVertex& oLower, const RowLimits& oRows);
     void Finish();
     void SortEdges();
@@ -83,8 +102,5 @@ private:
     std::vector<Edge> moEdges;
     // For every bundle of edges the last row of them all; then for every bundle of these, and so on.
     std::vector<std::vector<int>> moLastRows;
-    int mnFirstRow = std::numeric_limits<int>::max();
-    int mnLastRow = std::numeric_limits<int>::min();
-    double mnLeft = std::numeric_limits<double>::max();
-    double mnRight = std::numeric_limits<double>::lowest();
+    Extent moExtent;
 };

@@ -1,5 +1,6 @@
 #include "datasources/maskbuilder/detail/maskrows.h"
 
+#include <algorithm>
 #include <bit>
 #include <cstring>
 
@@ -8,6 +9,9 @@ namespace krv::datasources::detail
 
 namespace
 {
+
+// Less than what string instructions are used for, which clear past the nearest cache.
+constexpr std::ptrdiff_t CLEARED_AHEAD = 1024;
 
 // Between a word whose highest bit is the first and eight bytes whose highest bits are.
 std::uint64_t InByteOrder(std::uint64_t nWord)
@@ -23,8 +27,9 @@ void OrBytes(unsigned char* pTo, std::uint64_t nWord, std::size_t nBytes)
 
 } // namespace
 
-MaskRows::MaskRows(krv::gobs::Mask& oMask)
-    : mpBits(oMask.GetBits()), mnWidth(oMask.GetFullWidth()), mnHeight(oMask.GetFullHeight()),
+MaskRows::MaskRows(krv::gobs::Mask& oMask, bool bCleared)
+    : mpBits(oMask.GetBits()), mpEnd(mpBits + oMask.GetBitsSize()), mpCleared(bCleared ? mpEnd : mpBits),
+      mnWidth(oMask.GetFullWidth()), mnHeight(oMask.GetFullHeight()),
       mnFirstColumn(std::int64_t{oMask.GetX()} - oMask.GetXMargin()),
       mnFirstRow(std::int64_t{oMask.GetY()} - oMask.GetYMargin())
 {
@@ -34,6 +39,13 @@ PixelArea MaskRows::GetArea() const
 {
     return {mnFirstColumn, mnFirstColumn + static_cast<std::int64_t>(mnWidth) - 1, mnFirstRow,
             mnFirstRow + static_cast<std::int64_t>(mnHeight) - 1};
+}
+
+void MaskRows::ClearTo(unsigned char* pEnd)
+{
+    const std::ptrdiff_t nBytes = std::min(std::max(pEnd - mpCleared, CLEARED_AHEAD), mpEnd - mpCleared);
+    std::memset(mpCleared, 0, static_cast<std::size_t>(nBytes));
+    mpCleared += nBytes;
 }
 
 void MaskRows::SetBytes(unsigned char* pFirst, unsigned char* pEnd)
@@ -47,6 +59,9 @@ void MaskRows::OrWords(std::int64_t nRow, std::int64_t nFirst, const std::uint64
     const std::uint64_t nIndex = IndexOf(nFirst, nRow);
     const unsigned int nShift = nIndex % 8;
     unsigned char* pTo = mpBits + nIndex / 8;
+    unsigned char* const pEnd = mpBits + (nIndex + nBits + 7) / 8;
+    if (pEnd > mpCleared)
+        ClearTo(pEnd);
     std::uint64_t nCarry = 0; // what the word before left for the byte at its end, in the highest bits
     const std::uint64_t nWhole = nBits / 64;
     for (std::uint64_t i = 0; i < nWhole; ++i, pTo += 8)

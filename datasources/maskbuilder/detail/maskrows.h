@@ -19,10 +19,15 @@ struct PixelArea
 };
 
 // The bits of a mask by file pixels. Positions are not checked: they lie in the mask's full extent.
+//
+// The bytes of a mask that was not cleared are cleared a little ahead of the bits that are set, while they are in the
+// nearest cache; ClearRest ends that.
 class MaskRows
 {
 public:
-    explicit MaskRows(krv::gobs::Mask& oMask);
+    MaskRows(krv::gobs::Mask& oMask, bool bCleared);
+    MaskRows(const MaskRows&) = delete;
+    MaskRows& operator=(const MaskRows&) = delete;
 
     // The full extent.
     PixelArea GetArea() const;
@@ -33,6 +38,8 @@ public:
         const std::uint64_t nFrom = IndexOf(nFirst, nRow), nTo = IndexOf(nLast, nRow);
         unsigned char* const pFirst = mpBits + nFrom / 8;
         unsigned char* const pLast = mpBits + nTo / 8;
+        if (pLast >= mpCleared)
+            ClearTo(pLast + 1);
         const auto nHead = static_cast<unsigned char>(0xFFu >> (nFrom % 8));
         const auto nTail = static_cast<unsigned char>(0xFFu << (7 - nTo % 8));
         if (pFirst == pLast)
@@ -48,15 +55,20 @@ public:
     // Ors in the bits of a row from a column on, 64 in each word, the highest first; spare bits of the last word are 0.
     void OrWords(std::int64_t nRow, std::int64_t nFirst, const std::uint64_t* pWords, std::uint64_t nBits);
 
+    void ClearRest() { ClearTo(mpEnd); }
+
 private:
     std::uint64_t IndexOf(std::int64_t nColumn, std::int64_t nRow) const
     {
         return static_cast<std::uint64_t>(nRow - mnFirstRow) * mnWidth +
                static_cast<std::uint64_t>(nColumn - mnFirstColumn);
     }
+    void ClearTo(unsigned char* pEnd);
     static void SetBytes(unsigned char* pFirst, unsigned char* pEnd);
 
     unsigned char* mpBits;
+    unsigned char* mpEnd;
+    unsigned char* mpCleared; // the end of what is
     std::uint64_t mnWidth;
     std::uint64_t mnHeight;
     std::int64_t mnFirstColumn;

@@ -15,18 +15,22 @@ namespace krv::datasources::detail
 namespace
 {
 
+using Edge = GGLPolyRaster::Edge;
+
 constexpr int BLOCK_ROWS = 64;
 // Rows whose two planes are to stay in the nearest cache.
 constexpr int DENSE_ROWS = 32;
 // Crossings in a row from which on sorting them costs more than two planes.
-constexpr std::uint64_t MANY_CROSSINGS = 64;
+constexpr std::int64_t MANY_CROSSINGS = 64;
 // Wider areas would need planes beyond the caches.
 constexpr std::int64_t WIDEST_PLANE = 1 << 20;
 constexpr std::size_t SHORT_LIST = 24;
+// Crossings in a row up to which it has a slot for each.
+constexpr std::size_t FEW_CROSSINGS = 8;
 
 std::int64_t Truncated(double nValue)
 {
-    return static_cast<std::int64_t>(std::clamp(nValue, -9e18, 9e18));
+    return static_cast<std::int64_t>(std::min(std::max(nValue, -9e18), 9e18));
 }
 
 void Order(double& nLow, double& nHigh)
@@ -79,12 +83,107 @@ PixelArea Narrowed(PixelArea oArea, const GGLPolyRaster& oPolygon)
 // The rows of a block that an edge crosses.
 struct EdgeRows
 {
-    EdgeRows(const GGLPolyRaster::Edge& oEdge, int nFirstRow, int nLastRow)
+    EdgeRows(const Edge& oEdge, int nFirstRow, int nLastRow)
         : first(std::max(oEdge.firstRow, nFirstRow)), last(std::min(oEdge.lastRow, nLastRow))
     {
     }
     int first;
     int last;
+};
+
+// The crossings of a block of rows with few each, side by side: what is done to one row is done to several at once.
+class Slots
+{
+public:
+    // False when a row has more crossings than slots.
+    bool Place(const std::vector<const Edge*>& oActive, const Edge* pNew, const Edge* pNewEnd, int nFirstRow,
+               int nLastRow)
+    {
+        mnFirstRow = nFirstRow;
+        mnRows = static_cast<std::size_t>(nLastRow - nFirstRow + 1);
+        const auto bActive = [&](const Edge* pEdge)
+        {
+            return PlaceFrom(0, *pEdge);
+        };
+        if (!std::all_of(oActive.begin(), oActive.end(), bActive))
+            return false;
+        for (std::size_t r = 0; r < mnRows; ++r)
+        {
+            const int nRow = nFirstRow + static_cast<int>(r);
+            std::size_t nCount = moCounts[r];
+            for (; pNew != pNewEnd && pNew->firstRow == nRow; ++pNew)
+            {
+                if (nCount == FEW_CROSSINGS || (pNew->lastRow > nRow && !PlaceFrom(r + 1, *pNew)))
+                    return false;
+                moValues[nCount++][r] = pNew->x;
+            }
+            moCounts[r] = nCount;
+        }
+        mnCount = *std::max_element(moCounts.begin(), moCounts.end());
+        for (std::size_t r = 0; r < mnRows; ++r)
+        {
+            for (std::size_t i = moCounts[r]; i < mnCount; ++i)
+                moValues[i][r] = std::numeric_limits<double>::infinity();
+        }
+        return true;
+    }
+
+    // Neighbours in turn, as often as there are slots.
+    void Sort()
+    {
+        for (std::size_t nPass = 0; nPass < mnCount; ++nPass)
+        {
+            for (std::size_t i = nPass % 2; i + 1 < mnCount; i += 2)
+            {
+                for (std::size_t r = 0; r < mnRows; ++r)
+                    Order(moValues[i][r], moValues[i + 1][r]);
+            }
+        }
+    }
+
+    // Makes the ends of its span of every pair, clipped to the area; the first beyond the last where there is none.
+    void TakeSpans(double nFirst, double nLast)
+    {
+        for (std::size_t i = 0; i < mnCount; i += 2)
+        {
+            for (std::size_t r = 0; r < mnRows; ++r)
+            {
+                const double nCrossing = moValues[i + 1][r];
+                const double nStart = std::trunc(moValues[i][r] + 0.5);
+                const double nEnd = std::max(nStart, std::trunc(nCrossing - 0.5));
+                moValues[i][r] = std::max(nStart, nFirst);
+                moValues[i + 1][r] = nCrossing < nFirst ? nFirst - 1 : std::min(nEnd, nLast);
+            }
+        }
+    }
+
+    std::size_t GetRows() const { return mnRows; }
+    std::size_t GetCount() const { return mnCount; }
+    std::pair<double, double> GetSpan(std::size_t i, std::size_t r) const
+    {
+        return {moValues[i][r], moValues[i + 1][r]};
+    }
+
+private:
+    // From a row on, to the end of the edge or of the block.
+    bool PlaceFrom(std::size_t nFirst, const Edge& oEdge)
+    {
+        const auto nEnd = static_cast<std::size_t>(
+            std::min<std::int64_t>(std::int64_t{oEdge.lastRow} - mnFirstRow + 1, static_cast<std::int64_t>(mnRows)));
+        for (std::size_t r = nFirst; r < nEnd; ++r)
+        {
+            if (moCounts[r] == FEW_CROSSINGS)
+                return false;
+            moValues[moCounts[r]++][r] = oEdge.At(mnFirstRow + static_cast<int>(r));
+        }
+        return true;
+    }
+
+    std::array<std::array<double, BLOCK_ROWS>, FEW_CROSSINGS> moValues;
+    std::array<std::size_t, BLOCK_ROWS> moCounts{};
+    int mnFirstRow = 0;
+    std::size_t mnRows = 0;
+    std::size_t mnCount = 0;
 };
 
 constexpr std::array<std::array<std::uint64_t, 2>, 64> MakeBitMasks()
@@ -112,7 +211,7 @@ public:
     }
 
     // Rows nFirst to nLast, counted from the block's first.
-    void Flip(const GGLPolyRaster::Edge& oEdge, int nBlockRow, int nFirst, int nLast) const
+    void Flip(const Edge& oEdge, int nBlockRow, int nFirst, int nLast) const
     {
         Bits oBits;
         FindBits(oEdge, nBlockRow, nFirst / 4 * 4, nLast, oBits);
@@ -139,7 +238,7 @@ private:
 
 #ifdef __SSE4_1__
     // By fours of rows; those beyond the edge are not looked at.
-    void FindBits(const GGLPolyRaster::Edge& oEdge, int nBlockRow, int nFirst, int nLast, Bits& oBits) const
+    void FindBits(const Edge& oEdge, int nBlockRow, int nFirst, int nLast, Bits& oBits) const
     {
         const __m128d oX = _mm_set1_pd(oEdge.x), oSlope = _mm_set1_pd(oEdge.slope), oArea = _mm_set1_pd(mnFirst);
         const __m128d oFrom = _mm_set1_pd(static_cast<double>(std::int64_t{nBlockRow} + nFirst - oEdge.firstRow));
@@ -175,7 +274,7 @@ private:
         _mm_storeu_si128(reinterpret_cast<__m128i*>(pPlanes), _mm_or_si128(_mm_xor_si128(oOld, oBit), oAgain));
     }
 #else
-    void FindBits(const GGLPolyRaster::Edge& oEdge, int nBlockRow, int nFirst, int nLast, Bits& oBits) const
+    void FindBits(const Edge& oEdge, int nBlockRow, int nFirst, int nLast, Bits& oBits) const
     {
         const auto nFrom = static_cast<double>(std::int64_t{nBlockRow} - oEdge.firstRow);
         for (int nRow = nFirst; nRow <= nLast; ++nRow)
@@ -218,90 +317,114 @@ std::uint64_t RunningXor(std::uint64_t n)
 
 } // namespace
 
-PolygonFill::PolygonFill(const MaskRows& oRows, const PixelArea& oArea) : moRows(oRows), moArea(oArea) {}
+PolygonFill::PolygonFill(MaskRows& oRows, const PixelArea& oArea) : moRows(oRows), moArea(oArea) {}
 
 void PolygonFill::Fill(const GGLPolyRaster& oPolygon)
 {
     const PixelArea oWhole = moArea;
     moArea = Narrowed(oWhole, oPolygon);
     if (!moArea.IsEmpty())
-    {
-        for (std::int64_t nRow = moArea.firstRow; nRow <= moArea.lastRow; nRow += BLOCK_ROWS)
-            FillBlock(oPolygon, nRow, std::min(nRow + BLOCK_ROWS - 1, moArea.lastRow));
-    }
+        FillRows(oPolygon, static_cast<int>(moArea.firstRow), static_cast<int>(moArea.lastRow));
     moArea = oWhole;
 }
 
-void PolygonFill::FillBlock(const GGLPolyRaster& oPolygon, std::int64_t nFirstRow, std::int64_t nLastRow)
+void PolygonFill::FillRows(const GGLPolyRaster& oPolygon, int nFirstRow, int nLastRow)
 {
-    const auto nFirst = static_cast<int>(nFirstRow); // rows of a polygon are ints
-    const auto nLast = static_cast<int>(nLastRow);
-    oPolygon.FindEdges(nFirst, nLast, moEdges);
-    std::uint64_t nCrossings = 0;
-    for (const GGLPolyRaster::Edge& oEdge : moEdges)
+    const auto& oEdges = oPolygon.GetEdges();
+    const Edge* const pEnd = oEdges.data() + oEdges.size();
+    const std::size_t nAbove = oPolygon.CountEdgesAbove(nFirstRow);
+    oPolygon.FindReaching(nFirstRow, nAbove, moActive);
+    mpNew = mpNewEnd = oEdges.data() + nAbove;
+    for (std::int64_t nBlock = nFirstRow; nBlock <= nLastRow; nBlock += BLOCK_ROWS)
     {
-        const EdgeRows oRows(oEdge, nFirst, nLast);
-        nCrossings += static_cast<std::uint64_t>(oRows.last - oRows.first + 1);
+        const auto nFirst = static_cast<int>(nBlock);
+        const auto nLast = static_cast<int>(std::min<std::int64_t>(nBlock + BLOCK_ROWS - 1, nLastRow));
+        std::int64_t nCrossings = 0;
+        for (const Edge* pEdge : moActive)
+            nCrossings += std::min(pEdge->lastRow, nLast) - nFirst + 1;
+        for (; mpNewEnd != pEnd && mpNewEnd->firstRow <= nLast; ++mpNewEnd)
+            nCrossings += std::min(mpNewEnd->lastRow, nLast) - mpNewEnd->firstRow + 1;
+        FillBlock(oPolygon, nFirst, nLast, nCrossings);
+        std::erase_if(moActive, [nLast](const Edge* pEdge) { return pEdge->lastRow <= nLast; });
+        for (; mpNew != mpNewEnd; ++mpNew)
+        {
+            if (mpNew->lastRow > nLast)
+                moActive.push_back(mpNew);
+        }
     }
-    const bool bMany = nCrossings > MANY_CROSSINGS * static_cast<std::uint64_t>(nLast - nFirst + 1);
-    const bool bPlanesFit = moArea.lastColumn >= 0 && moArea.lastColumn < std::numeric_limits<int>::max() &&
-                            moArea.lastColumn - moArea.firstColumn < WIDEST_PLANE;
-    if (bMany && bPlanesFit)
-    {
-        for (int nRow = nFirst; nRow <= nLast; nRow += DENSE_ROWS)
-            FillDense(oPolygon, nRow, std::min(nRow + DENSE_ROWS - 1, nLast));
-    }
-    else if (nCrossings > 0)
-        FillSparse(nFirst, nLast, nCrossings);
 }
 
-void PolygonFill::FillSparse(int nFirstRow, int nLastRow, std::uint64_t nCrossings)
+void PolygonFill::FillBlock(const GGLPolyRaster& oPolygon, int nFirstRow, int nLastRow, std::int64_t nCrossings)
 {
-    const auto nRows = static_cast<std::size_t>(nLastRow - nFirstRow + 1);
-    // First the change of the number from row to row, then the numbers, then where the list of each row begins.
-    std::array<std::ptrdiff_t, BLOCK_ROWS + 1> oPlaces{};
-    for (const GGLPolyRaster::Edge& oEdge : moEdges)
+    const int nRows = nLastRow - nFirstRow + 1;
+    if (nCrossings <= nRows * static_cast<std::int64_t>(FEW_CROSSINGS) && FillFew(nFirstRow, nLastRow))
+        return;
+    const bool bPlanesFit = moArea.lastColumn >= 0 && moArea.lastColumn < std::numeric_limits<int>::max() &&
+                            moArea.lastColumn - moArea.firstColumn < WIDEST_PLANE;
+    if (nCrossings <= nRows * MANY_CROSSINGS || !bPlanesFit)
+        return FillSparse(nFirstRow, nLastRow);
+    for (std::int64_t nRow = nFirstRow; nRow <= nLastRow; nRow += DENSE_ROWS)
+        FillDense(oPolygon, static_cast<int>(nRow),
+                  static_cast<int>(std::min<std::int64_t>(nRow + DENSE_ROWS - 1, nLastRow)));
+}
+
+bool PolygonFill::FillFew(int nFirstRow, int nLastRow)
+{
+    Slots oSlots;
+    if (!oSlots.Place(moActive, mpNew, mpNewEnd, nFirstRow, nLastRow))
+        return false;
+    oSlots.Sort();
+    oSlots.TakeSpans(static_cast<double>(moArea.firstColumn), static_cast<double>(moArea.lastColumn));
+    // The writing comes last, by itself: how long each run is can hardly be foreseen, and what follows a wrong guess
+    // is quickly begun anew when the ends of the runs are there.
+    for (std::size_t r = 0; r < oSlots.GetRows(); ++r)
+        for (std::size_t i = 0; i < oSlots.GetCount(); i += 2)
+        {
+            const auto [nStart, nEnd] = oSlots.GetSpan(i, r);
+            if (nStart <= nEnd)
+                moRows.SetRun(nFirstRow + static_cast<int>(r), static_cast<std::int64_t>(nStart),
+                              static_cast<std::int64_t>(nEnd));
+        }
+    return true;
+}
+
+void PolygonFill::FillSparse(int nFirstRow, int nLastRow)
+{
+    moReaching = moActive;
+    moCrossings.resize(moActive.size() + static_cast<std::size_t>(mpNewEnd - mpNew));
+    const Edge* pNew = mpNew;
+    for (int nRow = nFirstRow; nRow <= nLastRow; ++nRow)
     {
-        const EdgeRows oRows(oEdge, nFirstRow, nLastRow);
-        ++oPlaces[static_cast<std::size_t>(oRows.first - nFirstRow)];
-        --oPlaces[static_cast<std::size_t>(oRows.last - nFirstRow) + 1];
+        std::size_t nCount = 0, nStay = 0;
+        for (const Edge* const pEdge : moReaching)
+        {
+            moCrossings[nCount++] = pEdge->At(nRow);
+            moReaching[nStay] = pEdge;
+            nStay += pEdge->lastRow > nRow ? 1 : 0;
+        }
+        moReaching.resize(nStay);
+        for (; pNew != mpNewEnd && pNew->firstRow == nRow; ++pNew)
+        {
+            moCrossings[nCount++] = pNew->x;
+            if (pNew->lastRow > nRow)
+                moReaching.push_back(pNew);
+        }
+        FillRow(nRow, moCrossings.data(), nCount);
     }
-    std::ptrdiff_t nInRow = 0, nPlace = 0;
-    for (std::size_t r = 0; r <= nRows; ++r)
-    {
-        nInRow += oPlaces[r];
-        oPlaces[r] = nPlace;
-        nPlace += nInRow;
-    }
-    const auto oBegins = oPlaces;
-    moCrossings.resize(nCrossings);
-    for (const GGLPolyRaster::Edge& oEdge : moEdges)
-    {
-        const EdgeRows oRows(oEdge, nFirstRow, nLastRow);
-        for (int nRow = oRows.first; nRow <= oRows.last; ++nRow)
-            moCrossings[static_cast<std::size_t>(oPlaces[static_cast<std::size_t>(nRow - nFirstRow)]++)] =
-                oEdge.At(nRow);
-    }
-    for (std::size_t r = 0; r < nRows; ++r)
-        FillRow(nFirstRow + static_cast<int>(r), moCrossings.data() + oBegins[r],
-                static_cast<std::size_t>(oBegins[r + 1] - oBegins[r]));
 }
 
 void PolygonFill::FillRow(int nRow, double* pCrossings, std::size_t nCount)
 {
     SortCrossings(pCrossings, nCount);
-    const auto nFirst = static_cast<double>(moArea.firstColumn);
-    std::size_t i = 0;
-    while (i + 1 < nCount && pCrossings[i + 1] < nFirst)
-        i += 2;
-    for (; i + 1 < nCount; i += 2)
+    const std::int64_t nFirst = moArea.firstColumn, nLast = moArea.lastColumn;
+    for (std::size_t i = 0; i + 1 < nCount; i += 2)
     {
         const std::int64_t nStart = Truncated(pCrossings[i] + 0.5);
-        if (nStart > moArea.lastColumn)
-            return;
         const std::int64_t nEnd = std::max(nStart, Truncated(pCrossings[i + 1] - 0.5));
-        if (nEnd >= moArea.firstColumn)
-            moRows.SetRun(nRow, std::max(nStart, moArea.firstColumn), std::min(nEnd, moArea.lastColumn));
+        if (nStart > nLast)
+            return;
+        if (nEnd >= nFirst && !(pCrossings[i + 1] < static_cast<double>(nFirst)))
+            moRows.SetRun(nRow, std::max(nStart, nFirst), std::min(nEnd, nLast));
     }
 }
 
@@ -335,11 +458,11 @@ bool PolygonFill::Flip(int nFirstRow, int nLastRow)
                               mnRowWords);
     const bool bAtZero = moArea.firstColumn <= 0;
     bool bSpanRows = false;
-    for (const GGLPolyRaster::Edge& oEdge : moEdges)
+    const auto FlipEdge = [&](const Edge& oEdge)
     {
         const EdgeRows oRows(oEdge, nFirstRow, nLastRow);
         if (oRows.first > oRows.last)
-            continue;
+            return;
         if (bAtZero && std::min(oEdge.At(oRows.first), oEdge.At(oRows.last)) < 0)
         {
             bSpanRows = true;
@@ -350,7 +473,10 @@ bool PolygonFill::Flip(int nFirstRow, int nLastRow)
             }
         }
         oFlipper.Flip(oEdge, nFirstRow, oRows.first - nFirstRow, oRows.last - nFirstRow);
-    }
+    };
+    for (const Edge* const pEdge : moActive)
+        FlipEdge(*pEdge);
+    std::for_each(mpNew, mpNewEnd, FlipEdge);
     return bSpanRows;
 }
 
