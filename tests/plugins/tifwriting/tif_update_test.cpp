@@ -12,8 +12,10 @@
 #include <map>
 #include <thread>
 
+#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <poll.h>
 #include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -180,17 +182,25 @@ constexpr WayOfWriting WAYS[] = {
          return Bytes();
      }}};
 
-// Runs a writer that never ends and kills it at a random moment.
+// Runs a writer that never ends and kills it at a random moment; bLater: not before it tells that it has done
+// something.
 template <typename Writer>
-void Kill(std::mt19937& oRandom, Writer oWriter)
+void Kill(std::mt19937& oRandom, bool bLater, Writer oWriter)
 {
+    int aPipe[2] = {};
+    ASSERT_EQ(::pipe2(aPipe, O_NONBLOCK), 0);
     const pid_t nChild = ::fork();
     if (nChild == 0)
-        oWriter();
+        oWriter([&] { return ::write(aPipe[1], "", 1); });
+    pollfd oTold = {aPipe[0], POLLIN, 0};
+    if (bLater)
+        ::poll(&oTold, 1, 60000);
     std::this_thread::sleep_for(std::chrono::microseconds(oRandom() % 60000));
     ::kill(nChild, SIGKILL);
     int nStatus = 0;
     ::waitpid(nChild, &nStatus, 0);
+    ::close(aPipe[0]);
+    ::close(aPipe[1]);
     ASSERT_TRUE(WIFSIGNALED(nStatus) && WTERMSIG(nStatus) == SIGKILL) << "the writer failed before it was killed";
 }
 
@@ -218,8 +228,8 @@ TEST(TifUpdate, AKilledWriterLeavesTheLastSynchronisedState)
             const bool bNew = nRun % 2 == 1;
             if (!bNew)
                 CreateTif(fileName, pKind, 300, 200, 1, krv::gobs::eDT_8U)->Close();
-            Kill(oRandom,
-                 [&]
+            Kill(oRandom, nRun + 1 == KillRuns(),
+                 [&](auto oTell)
                  {
                      const TifPointer poDataset =
                          bNew ? CreateTif(fileName, pKind, 300, 200, 1, krv::gobs::eDT_8U) : OpenTif(fileName, eUpdate);
@@ -227,6 +237,7 @@ TEST(TifUpdate, AKilledWriterLeavesTheLastSynchronisedState)
                      {
                          WriteState(*poDataset, oWay, nState);
                          poDataset->Synchronize();
+                         oTell();
                      }
                  });
             if (bNew && !std::filesystem::exists(fileName))
@@ -251,8 +262,8 @@ TEST(TifUpdate, AKilledWriterOfAnOrderedFileLeavesTheOneBefore)
     {
         const TempFolder oFolder;
         const std::string fileName = oFolder.File("k.tif");
-        Kill(oRandom,
-             [&]
+        Kill(oRandom, nRun + 1 == KillRuns(),
+             [&](auto oTell)
              {
                  for (unsigned char nState = 1;; ++nState)
                  {
@@ -262,6 +273,7 @@ TEST(TifUpdate, AKilledWriterOfAnOrderedFileLeavesTheOneBefore)
                          WAYS[nWay].mpWrite(*poDataset, nState);
                      WriteState(*poDataset, WAYS[0], nState);
                      poDataset->Close();
+                     oTell();
                  }
              });
         for (const std::string& name : ListFolder(oFolder.GetPath()))
