@@ -104,6 +104,9 @@ OverviewBuilder::OverviewBuilder(IRasterWriter& oWriter, Resampling eMethod, con
 {
     if (const auto* const poAccess = dynamic_cast<const RasterAccess*>(&oWriter))
         mpoDataset = poAccess->GetDataset();
+    const auto* const poRaster = dynamic_cast<const IRasterDataset*>(mpoDataset);
+    if (poRaster != nullptr && (poRaster->GetWidth() != moForm.mnWidth || poRaster->GetHeight() != moForm.mnHeight))
+        throw krv::DataException("Overviews: the dataset and its raster I/O are of different sizes", oPlace);
     if (moValidity.HasBitmap())
         FindMask();
 }

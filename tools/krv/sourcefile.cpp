@@ -138,9 +138,20 @@ std::vector<ChannelGroup> SourceFile::GroupByType(const std::vector<unsigned int
     return oGroups;
 }
 
+std::unique_ptr<krv::datasources::BasicReader> SourceFile::ReadFull(const std::vector<unsigned int>& oChannels) const
+{
+    auto poReader = std::make_unique<krv::datasources::BasicReader>(mpoDataset.get(), oChannels, false);
+    const auto& oRaster = GetRaster();
+    if (poReader->GetWidth() != oRaster.GetWidth() || poReader->GetHeight() != oRaster.GetHeight())
+        throw krv::DataException(fmt::format("{}: the image says to be of {} x {} pixels, its channels of {} x {}",
+                                             moName, oRaster.GetWidth(), oRaster.GetHeight(), poReader->GetWidth(),
+                                             poReader->GetHeight()));
+    return poReader;
+}
+
 LevelReader SourceFile::Read(const std::vector<unsigned int>& oChannels, unsigned int nLevel) const
 {
-    auto poFull = std::make_unique<krv::datasources::BasicReader>(mpoDataset.get(), oChannels, false);
+    auto poFull = ReadFull(oChannels);
     if (nLevel <= 1)
         return {std::move(poFull), nullptr, nullptr};
     std::unique_ptr<IOverviewReaderAccessor> poAccessor(poFull->GetOverviewReaderAccessor());
@@ -154,7 +165,7 @@ LevelReader SourceFile::Read(const std::vector<unsigned int>& oChannels, unsigne
 LevelReader SourceFile::ReadAtLeast(const std::vector<unsigned int>& oChannels, unsigned int nWidth,
                                     unsigned int nHeight) const
 {
-    auto poFull = std::make_unique<krv::datasources::BasicReader>(mpoDataset.get(), oChannels, false);
+    auto poFull = ReadFull(oChannels);
     std::unique_ptr<IOverviewReaderAccessor> poAccessor(poFull->GetOverviewReaderAccessor());
     std::vector<unsigned int> oLevels = poAccessor != nullptr ? poAccessor->GetLevels() : std::vector<unsigned int>();
     std::sort(oLevels.rbegin(), oLevels.rend());

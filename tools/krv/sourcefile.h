@@ -11,6 +11,7 @@
 
 namespace krv::datasources
 {
+class BasicReader;
 class IDataset;
 class IOverviewReaderAccessor;
 class IRasterDataset;
@@ -81,6 +82,9 @@ public:
                             unsigned int nHeight) const;
 
 private:
+    // A format plug-in's answers need not agree.
+    std::unique_ptr<krv::datasources::BasicReader> ReadFull(const std::vector<unsigned int>& oChannels) const;
+
     std::string moName;
     std::unique_ptr<krv::datasources::IDataset> mpoDataset;
     krv::datasources::IRasterDataset* mpoRaster; // a facet of the dataset

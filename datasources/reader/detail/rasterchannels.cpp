@@ -114,12 +114,10 @@ OpenedChannels OpenChannels(IRasterDataset& oDataset, const std::vector<unsigned
         throw krv::DataException("Channel " + std::to_string(oChannels.front()) + " is of the type " +
                                      oOpened.moType.Describe() + ", which no I/O hands out",
                                  oPlace);
-    const bool bWholeImage = oRasterIO == nullptr;
-    oOpened.mpoRasterIO =
-        bWholeImage ? std::unique_ptr<IRasterIO>(oDataset.GetRasterIO(oChannels)) : std::move(oRasterIO);
+    oOpened.mpoRasterIO = std::move(oRasterIO);
+    if (oOpened.mpoRasterIO == nullptr)
+        oOpened.mpoRasterIO.reset(oDataset.GetRasterIO(oChannels));
     MeasureImage(oOpened, oPlace);
-    if (bWholeImage && (oOpened.mnWidth != oDataset.GetWidth() || oOpened.mnHeight != oDataset.GetHeight()))
-        throw krv::DataException("The dataset and its raster I/O are of different sizes", oPlace);
     return oOpened;
 }
 
