@@ -258,6 +258,7 @@ TEST_F(MaskCommand, FailuresSayWhyOnOneLineAndChangeNothing)
         {{moFile, "--polygon", "POINT(1 2)"}, 2, "expected at character 1 "},
         {{moFile, "--polygon", "null"}, 2, "expected at character 1 "},
         {{moFile, "--polygon", "SRID=4326;" + square, "--coordinates", "pixel"}, 2, "EPSG:4326"},
+        {{moFile, "--polygon", "SRID=4326;" + square, "--coordinates", "map"}, 2, "EPSG:4326"},
         {{moFile, "--polygon", square, "--crs", ""}, 2, "no known reference system"},
         {{moFile, "--polygon", moFolder.GetPath()}, 2, "folder"},
         {{moFile, "--polygon", moFile}, 2, "scene.tif"},

@@ -68,13 +68,14 @@ PolygonPlacer::PolygonPlacer(const SourceFile& oFile, const MaskRequest& oReques
         eMeaning = PolygonCoordinates::eNamedMap;
         crs = oText.crs.empty() ? "EPSG:4326" : oText.crs;
     }
+    if (!oText.crs.empty() && eMeaning == PolygonCoordinates::eMap)
+        throw UsageError("--polygon: --coordinates map means the file's own reference system, but the polygon names " +
+                         oText.crs + "; leave one of them out");
+    if (!oText.crs.empty() && eMeaning == PolygonCoordinates::ePixels)
+        throw UsageError("--polygon: pixels have no reference system, but the polygon names " + oText.crs +
+                         "; leave that out or --coordinates pixel");
     if (eMeaning == PolygonCoordinates::ePixels)
-    {
-        if (!oText.crs.empty())
-            throw UsageError("--polygon: pixels have no reference system, but the polygon names " + oText.crs +
-                             "; leave that out or --coordinates pixel");
         return;
-    }
     const auto* const poGeocoded = dynamic_cast<krv::datasources::IGeocodedDataset*>(&oFile.GetDataset());
     if (poGeocoded == nullptr || poGeocoded->GetGeocoding().IsIdentity() || !poGeocoded->GetGeocoding().IsInvertible())
         throw krv::DataException(oFile.GetName() + ": the file is not georeferenced; give polygons in pixels, with "
