@@ -94,7 +94,10 @@ void StrileDecoder::Decode(std::uint32_t nStrile, std::uint32_t nStoredRows, uns
     const std::size_t nBytes = nStoredPitch * (bOwn ? oWanted.mnRows : nStoredRows);
     const bool bDirect = moForm.moSample.meWidening == Widening::eNone && oWanted.mnPitch == nStoredPitch &&
                          oWanted.mnWidth == moForm.mnStrileWidth && (bOwn || oWanted.mnRows == nStoredRows);
-    unsigned char* pStored = bDirect ? oWanted.mpTarget : moScratch.Get(nBytes);
+    // Before a predictor, memory that stays in the processor's caches takes what the codec writes and reads again; the
+    // target is then written once.
+    const bool bPassing = bOwn && moForm.mnPredictor != PREDICTOR_NONE && nBytes <= KEPT_SCRATCH_BYTES;
+    unsigned char* pStored = bDirect && !bPassing ? oWanted.mpTarget : moScratch.Get(nBytes);
     if (!bOwn)
     {
         // A codec that stops early must not hand out what was there before.
@@ -118,6 +121,9 @@ void StrileDecoder::UndoPredictor(unsigned char* pStored, std::size_t nStoredPit
     const bool bWiden = oSample.meWidening != Widening::eNone;
     if (moForm.mnPredictor == PREDICTOR_FLOATINGPOINT)
     {
+        if (!bWiden && oWanted.mnWidth == nStoredWidth)
+            return codec::UndoFloatingPoint(pStored, nStoredPitch, oWanted.mpTarget, oWanted.mnPitch, oShape,
+                                            moPredictorScratch);
         codec::UndoFloatingPoint(pStored, nStoredPitch, pStored, nStoredPitch, oShape, moPredictorScratch);
         return Finish(pStored, nStoredPitch, false, oWanted);
     }
