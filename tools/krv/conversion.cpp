@@ -125,11 +125,13 @@ bool HasOption(const std::string& options, const std::string& beginning)
     return false;
 }
 
-// Samples of one bit stay so where the format can do it and the user wants nothing else. JPEG has none.
+// Samples of one bit stay so where the format can do it and the user wants nothing else. JPEG has none, differences of
+// values neither.
 std::string CompleteOptions(const CopyPlan& oPlan, const std::string& format, const std::string& options)
 {
     const unsigned int nBits = oPlan.GetNarrowBits();
     if (nBits == 0 || HasOption(options, "NBITS=") || HasOption(options, "COMPRESS=JPEG") ||
+        HasOption(options, "PREDICTOR=2") ||
         !DatasetManager::GetInstance()->GetCapabilities(format).IsSupported(CAPABILITY_NARROW_SAMPLES))
         return options;
     return fmt::format("{} NBITS={}", options, nBits);
