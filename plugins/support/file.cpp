@@ -24,6 +24,49 @@ constexpr std::size_t SLICE_BYTES = 256 * 1024;
 // A call to the system costs about as much as copying this many bytes.
 constexpr std::size_t CALL_BYTES = 4096;
 
+// Locks on bytes from here on stand for the roots of states; no file reaches so far.
+constexpr std::uint64_t FIRST_ROOT = std::uint64_t{1} << 62;
+constexpr std::uint64_t ROOTS = std::uint64_t{1} << 62;
+// No state's: whether locks work is tried on it.
+constexpr std::uint64_t TRIED_ROOT = ROOTS - 1;
+// More states than any use has at one time are not told apart.
+constexpr std::size_t MAXIMUM_HELD = 1000;
+
+// Locks that belong to the open file, not to the process: opening and closing the file elsewhere does not touch them.
+struct flock MakeLock(short nType, std::uint64_t nRoot, std::uint64_t nRoots)
+{
+    struct flock oLock = {};
+    oLock.l_type = nType;
+    oLock.l_whence = SEEK_SET;
+    oLock.l_start = static_cast<off_t>(FIRST_ROOT + nRoot);
+    oLock.l_len = static_cast<off_t>(nRoots);
+    return oLock;
+}
+
+bool SetLock(int nDescriptor, short nType, std::uint64_t nRoot)
+{
+    struct flock oLock = MakeLock(nType, nRoot, 1);
+    return ::fcntl(nDescriptor, F_OFD_SETLK, &oLock) == 0;
+}
+
+// Adds the roots from nBegin to before nEnd that others hold. The system tells one of them at a time, any.
+bool CollectHeld(int nDescriptor, std::uint64_t nBegin, std::uint64_t nEnd, std::vector<std::uint64_t>& oHeld)
+{
+    if (nBegin >= nEnd)
+        return true;
+    struct flock oLock = MakeLock(F_WRLCK, nBegin, nEnd - nBegin);
+    if (oHeld.size() == MAXIMUM_HELD || ::fcntl(nDescriptor, F_OFD_GETLK, &oLock) != 0)
+        return false;
+    if (oLock.l_type == F_UNLCK)
+        return true;
+    // Whatever is larger than one byte is not of this library.
+    const std::uint64_t nFound = static_cast<std::uint64_t>(oLock.l_start) - FIRST_ROOT;
+    if (oLock.l_len != 1 || nFound < nBegin || nFound >= nEnd)
+        return false;
+    oHeld.push_back(nFound);
+    return CollectHeld(nDescriptor, nBegin, nFound, oHeld) && CollectHeld(nDescriptor, nFound + 1, nEnd, oHeld);
+}
+
 int OpenFlags(File::Mode eMode)
 {
     switch (eMode)
@@ -215,6 +258,41 @@ void File::CutBack(std::uint64_t nBytes) noexcept
         return;
     if (::ftruncate(mnDescriptor, static_cast<off_t>(nBytes)) == 0)
         mnSize = nBytes;
+}
+
+bool File::Hold(std::uint64_t nRoot) noexcept
+{
+    if (nRoot >= TRIED_ROOT || !SetLock(mnDescriptor, F_RDLCK, nRoot))
+        return false;
+    if (moHeld && *moHeld != nRoot)
+        SetLock(mnDescriptor, F_UNLCK, *moHeld);
+    moHeld = nRoot;
+    return true;
+}
+
+std::optional<std::vector<std::uint64_t>> File::FindHeld() const
+{
+    std::vector<std::uint64_t> oHeld;
+    if (!CanSeeLocks() || !CollectHeld(mnDescriptor, 0, TRIED_ROOT, oHeld))
+        return std::nullopt;
+    return oHeld;
+}
+
+// Tried with a second opening of the file: some file systems take locks and tell nobody, on some the lock of writers
+// keeps readers from theirs.
+bool File::CanSeeLocks() const
+{
+    if (!moSeesLocks)
+    {
+        const std::string path = "/proc/self/fd/" + std::to_string(mnDescriptor);
+        const int nReader = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
+        struct flock oLock = MakeLock(F_WRLCK, TRIED_ROOT, 1);
+        moSeesLocks = nReader >= 0 && SetLock(nReader, F_RDLCK, TRIED_ROOT) &&
+                      ::fcntl(mnDescriptor, F_OFD_GETLK, &oLock) == 0 && oLock.l_type == F_RDLCK;
+        if (nReader >= 0)
+            ::close(nReader);
+    }
+    return *moSeesLocks;
 }
 
 void File::EndWriting() noexcept

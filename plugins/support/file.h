@@ -5,8 +5,10 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 #include <source_location>
 #include <string>
+#include <vector>
 
 namespace krv::plugins::support
 {
@@ -65,6 +67,13 @@ public:
     // it is.
     void CutBack(std::uint64_t nBytes) noexcept;
 
+    // Tells writers that this object reads the state of the file that a root names: its place, or another number below
+    // 2^62. Until another one is held, or the object goes. Returns false where the file system has no locks. What is
+    // read is of that state if the root is the file's still after the call; see HoldRoot.
+    bool Hold(std::uint64_t nRoot) noexcept;
+    // The roots that others hold, in this process or another; no value where that cannot be known.
+    std::optional<std::vector<std::uint64_t>> FindHeld() const;
+
     // Nothing more is written: others may. Reading goes on.
     void EndWriting() noexcept;
 
@@ -76,12 +85,31 @@ public:
     void Rename(const std::string& fileName, const Place& oPlace = Place::Current());
 
 private:
+    bool CanSeeLocks() const;
+
     std::string moName;
     std::string moPath;
     int mnDescriptor = -1;
     std::uint64_t mnSize = 0;
     bool mbLinked = false; // some file systems do not count names
+    std::optional<std::uint64_t> moHeld;
+    mutable std::optional<bool> moSeesLocks;
 };
+
+// Holds the state that a file is in. oReadRoot: reads the root from the file, as often as a writer changes it just now;
+// what was read last is held.
+template <typename ReadRoot>
+void HoldRoot(File& oFile, ReadRoot oReadRoot)
+{
+    std::uint64_t nRoot = oReadRoot();
+    while (oFile.Hold(nRoot))
+    {
+        const std::uint64_t nNow = oReadRoot();
+        if (nNow == nRoot)
+            return;
+        nRoot = nNow;
+    }
+}
 
 // A name for what becomes fileName when it is whole: in the same folder, so that it can be renamed, of no length that a
 // folder does not take, and of this process alone. Throws FileNotFoundException when there is no such folder, and

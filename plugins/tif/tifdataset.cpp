@@ -76,9 +76,17 @@ struct TifDataset::PageTable
 };
 
 TifDataset::TifDataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat)
-    : Dataset(fileName, poFormat), mpoFile(std::make_shared<support::File>(fileName, support::File::Mode::eRead))
+    : Dataset(fileName, poFormat)
 {
-    const FileHeader oHeader = ReadHeader(*mpoFile);
+    const auto poFile = std::make_shared<support::File>(fileName, support::File::Mode::eRead);
+    FileHeader oHeader;
+    const auto ReadRoot = [&]
+    {
+        oHeader = ReadHeader(*poFile);
+        return oHeader.mnFirstDirectory;
+    };
+    support::HoldRoot(*poFile, ReadRoot);
+    mpoFile = poFile;
     mpoPage = std::make_shared<Page>(mpoFile, oHeader, oHeader.mnFirstDirectory);
     SetImage(MakePageSource(mpoPage, PixelUse::eImage));
 }

@@ -40,7 +40,7 @@ std::vector<Placed> Sort(const std::vector<std::shared_ptr<PageModel>>& oPages)
     return oSorted;
 }
 
-void PlaceDirectory(Placed& oPlaced, const FileHeader& oHeader, Space& oSpace)
+void PlaceDirectory(Placed& oPlaced, const FileHeader& oHeader, support::Space& oSpace)
 {
     const std::size_t nWord = oHeader.mbBigTiff ? 8 : 4;
     PageModel& oPage = oPlaced.moPage;
@@ -54,7 +54,7 @@ void PlaceDirectory(Placed& oPlaced, const FileHeader& oHeader, Space& oSpace)
     oPlaced.moCountArray = oSpace.Allocate(oPage.GetStriles() * nWord);
 }
 
-void CopyBlocks(Placed& oPlaced, const support::File& oSource, Space& oSpace, support::File& oTarget)
+void CopyBlocks(Placed& oPlaced, const support::File& oSource, support::Space& oSpace, support::File& oTarget)
 {
     std::vector<unsigned char> oBytes;
     PageModel& oPage = oPlaced.moPage;
@@ -97,7 +97,8 @@ void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, con
                       const support::File& oSource, support::File& oTarget)
 {
     std::vector<Placed> oSorted = Sort(oPages);
-    Space oSpace(oTarget.GetName(), oHeader.GetBytes(), oHeader.mbBigTiff ? INT64_MAX : UINT32_MAX);
+    support::Space oSpace(oTarget.GetName(), oHeader.GetBytes(), oHeader.mbBigTiff ? INT64_MAX : UINT32_MAX,
+                          "the file would pass the limit of 4 GiB of classic TIFF");
     for (Placed& oPlaced : oSorted)
         PlaceDirectory(oPlaced, oHeader, oSpace);
     for (auto oPlaced = oSorted.rbegin(); oPlaced != oSorted.rend(); ++oPlaced)

@@ -66,8 +66,9 @@ FileEditor::FileEditor(const std::string& fileName)
     : moFileName(fileName), mpoFile(std::make_shared<support::File>(fileName, support::File::Mode::eUpdate)),
       moHeader(ReadHeader(*mpoFile))
 {
-    mpoSpace = std::make_unique<Space>(fileName, mpoFile->GetSize(), moHeader.mbBigTiff ? INT64_MAX : CLASSIC_LIMIT);
-    mpoSpace->Age();
+    UseSpace(mpoFile->GetSize());
+    mpoSpace->Keep(0, mpoFile->GetSize());
+    mpoSpace->Age(moHeader.mnFirstDirectory);
     mnCommittedSize = mpoFile->GetSize();
     ReadPages();
 }
@@ -261,11 +262,15 @@ void FileEditor::CreateFile(bool bBigTiff, bool bGap)
     moHeader = FileHeader();
     moHeader.mbBigTiff = bBigTiff;
     const std::uint64_t nHeader = moHeader.GetBytes();
-    mpoSpace = std::make_unique<Space>(moFileName, bGap ? FIRST_BLOCK : nHeader, bBigTiff ? INT64_MAX : CLASSIC_LIMIT);
-    if (bGap)
-        mpoSpace->AddGap(nHeader, FIRST_BLOCK - nHeader);
-    else
-        mpoSpace->AddGap(nHeader, 0);
+    UseSpace(bGap ? FIRST_BLOCK : nHeader);
+    mpoSpace->AddGap(nHeader, bGap ? FIRST_BLOCK - nHeader : 0);
+}
+
+void FileEditor::UseSpace(std::uint64_t nEnd)
+{
+    mpoSpace = std::make_unique<support::Space>(moFileName, nEnd, moHeader.mbBigTiff ? INT64_MAX : CLASSIC_LIMIT,
+                                                "the file would pass the limit of 4 GiB of classic TIFF; write it as "
+                                                "BigTIFF (option BIGTIFF=YES)");
 }
 
 std::shared_ptr<PageModel> FileEditor::AddFirstPage(const NewImage& oImage, const Place& oPlace)
@@ -600,9 +605,9 @@ void FileEditor::Commit(const std::vector<Written>& oWritten)
         ReleaseWritten(oWritten);
         throw;
     }
-    mpoSpace->Age();
     mnCommittedSize = mpoFile->GetSize();
     moHeader.mnFirstDirectory = bFirst ? oFirst.moDirectory.mnOffset : moPages.front()->moDirectory.mnOffset;
+    mpoSpace->Age(moHeader.mnFirstDirectory);
     unsigned char aHeader[FileHeader::BYTES] = {};
     moHeader.Write(aHeader, moHeader.mnFirstDirectory);
     const std::size_t nPlace = moHeader.mbBigTiff ? 8 : 4;
@@ -618,7 +623,8 @@ void FileEditor::Commit(const std::vector<Written>& oWritten)
     for (const Extent& oExtent : std::exchange(moReleased, {}))
         mpoSpace->Release(oExtent);
     mbChanged = false;
-    mpoSpace->Reuse();
+    // Nobody reads what has no name yet.
+    mpoSpace->Reuse(bNew ? support::Space::Roots(std::in_place) : mpoFile->FindHeld());
 }
 
 void FileEditor::Adopt(const Written& oWritten)

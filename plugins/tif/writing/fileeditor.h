@@ -1,9 +1,9 @@
 #pragma once
 
 #include "plugins/support/file.h"
+#include "plugins/support/space.h"
 #include "plugins/tif/page.h"
 #include "plugins/tif/writing/pagemodel.h"
-#include "plugins/tif/writing/space.h"
 
 #include <cstdint>
 #include <memory>
@@ -88,6 +88,7 @@ private:
     void ReadStriles(PageModel& oPage, const RawDirectory& oDirectory);
     std::vector<std::uint64_t> ReadArray(const DirectoryEntry& oEntry);
     void CreateFile(bool bBigTiff, bool bGap);
+    void UseSpace(std::uint64_t nEnd);
     std::uint64_t GetReserve() const;
     // Records the new place of a strip or tile and releases the old one.
     void MoveStrile(PageModel& oPage, std::uint64_t nStrile, const Extent& oOld, const Extent& oNew,
@@ -105,7 +106,7 @@ private:
     std::string moTemporary; // of a new file, until it has its own name
     std::shared_ptr<support::File> mpoFile;
     FileHeader moHeader;
-    std::unique_ptr<Space> mpoSpace;
+    std::unique_ptr<support::Space> mpoSpace;
     std::vector<std::shared_ptr<PageModel>> moPages;
     std::vector<std::weak_ptr<PageWriter>> moWriters;
     std::uint64_t mnNextNumber = 1;

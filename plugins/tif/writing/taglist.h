@@ -1,8 +1,8 @@
 #pragma once
 
 #include "plugins/support/file.h"
+#include "plugins/support/space.h"
 #include "plugins/tif/rawdirectory.h"
-#include "plugins/tif/writing/space.h"
 
 #include <cstdint>
 #include <string>
@@ -10,6 +10,8 @@
 
 namespace krv::plugins::tif
 {
+
+using support::Extent;
 
 // A tag with its values as bytes in the order of the file. Large values of a file that was opened stay there.
 struct Tag

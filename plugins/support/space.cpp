@@ -1,10 +1,10 @@
-#include "plugins/tif/writing/space.h"
+#include "plugins/support/space.h"
 
 #include "toolkit/exceptions/exceptions.h"
 
 #include <iterator>
 
-namespace krv::plugins::tif
+namespace krv::plugins::support
 {
 
 namespace
@@ -16,15 +16,26 @@ constexpr std::uint64_t LARGE_PIECE = 32768;
 
 } // namespace
 
-Space::Space(const std::string& fileName, std::uint64_t nEnd, std::uint64_t nLimit)
-    : moFileName(fileName), mnEnd(nEnd), mnForeignEnd(nEnd), mnLimit(nLimit)
+Space::Space(const std::string& fileName, std::uint64_t nEnd, std::uint64_t nLimit, const std::string& limitText)
+    : moFileName(fileName), moLimitText(limitText), mnEnd(nEnd), mnLimit(nLimit)
 {
 }
 
 void Space::AddGap(std::uint64_t nOffset, std::uint64_t nBytes)
 {
-    mnForeignEnd = nOffset;
-    AddFree(nOffset, nBytes);
+    if (nBytes != 0)
+        AddFree(nOffset, nBytes);
+}
+
+void Space::AddUnused(std::uint64_t nOffset, std::uint64_t nBytes)
+{
+    moGivenUp.push_back({{nOffset, nBytes, 0}, 1});
+}
+
+void Space::Keep(std::uint64_t nOffset, std::uint64_t nBytes)
+{
+    if (nBytes != 0)
+        moKept[nOffset] = nOffset + nBytes;
 }
 
 Extent Space::Allocate(std::uint64_t nBytes, std::uint64_t nReserve, const Place& oPlace)
@@ -42,10 +53,7 @@ Extent Space::Allocate(std::uint64_t nBytes, std::uint64_t nReserve, const Place
     const bool bPages = nBytes >= LARGE_PIECE && nBytes % PAGE == 0;
     const std::uint64_t nOffset = mnEnd + (bPages ? (PAGE - mnEnd % PAGE) % PAGE : mnEnd % 2);
     if (nTaken > mnLimit || nReserve > mnLimit - nTaken || nOffset > mnLimit - nTaken - nReserve)
-        throw IOException(moFileName,
-                          moFileName + ": the file would pass the limit of 4 GiB of classic TIFF; write it as BigTIFF "
-                                       "(option BIGTIFF=YES)",
-                          oPlace);
+        throw IOException(moFileName, moFileName + ": " + moLimitText, oPlace);
     const std::uint64_t nGap = mnEnd + mnEnd % 2;
     mnEnd = nOffset + nTaken;
     if (nGap < nOffset)
@@ -56,20 +64,55 @@ Extent Space::Allocate(std::uint64_t nBytes, std::uint64_t nReserve, const Place
 void Space::Release(const Extent& oExtent, std::uint64_t nKept)
 {
     nKept += nKept % 2;
-    if (oExtent.mnOffset < mnForeignEnd || nKept >= oExtent.mnBytes)
+    if (nKept >= oExtent.mnBytes)
         return;
     const Extent oRest{oExtent.mnOffset + nKept, oExtent.mnBytes - nKept, oExtent.mnGeneration};
+    const auto oKept = moKept.lower_bound(oRest.mnOffset + oRest.mnBytes);
+    if (oKept != moKept.begin() && std::prev(oKept)->second > oRest.mnOffset)
+        return;
     if (IsFresh(oExtent))
         AddFree(oRest.mnOffset, oRest.mnBytes);
     else
-        moPending.push_back(oRest);
+        moGivenUp.push_back({oRest, 0});
 }
 
-void Space::Reuse()
+void Space::Age(std::uint64_t nRoot)
 {
-    for (const Extent& oExtent : moPending)
-        AddFree(oExtent.mnOffset, oExtent.mnBytes);
-    moPending.clear();
+    moRoots[nRoot] = mnGeneration++;
+}
+
+void Space::Reuse(const Roots& oHeld)
+{
+    const std::uint64_t nState = mnGeneration - 1;
+    for (GivenUp& oPiece : moGivenUp)
+        if (oPiece.mnSince == 0)
+            oPiece.mnSince = nState;
+    if (!oHeld)
+        return;
+    std::set<std::uint64_t> oStates; // 0 stands for one from before the file was opened
+    for (const std::uint64_t nRoot : *oHeld)
+        oStates.insert(moRoots.contains(nRoot) ? moRoots[nRoot] : 0);
+    std::erase_if(moRoots,
+                  [&](const auto& oRoot) { return oRoot.second != nState && !oStates.contains(oRoot.second); });
+    std::erase_if(moGivenUp,
+                  [&](const GivenUp& oPiece)
+                  {
+                      const auto oNeeds = oStates.lower_bound(oPiece.moExtent.mnGeneration);
+                      if (oNeeds != oStates.end() && *oNeeds < oPiece.mnSince)
+                          return false;
+                      AddFree(oPiece.moExtent.mnOffset, oPiece.moExtent.mnBytes);
+                      return true;
+                  });
+}
+
+std::uint64_t Space::TrimEnd()
+{
+    if (!moFree.empty() && std::prev(moFree.end())->first + std::prev(moFree.end())->second == mnEnd)
+    {
+        mnEnd = std::prev(moFree.end())->first;
+        RemoveFree(std::prev(moFree.end()));
+    }
+    return mnEnd;
 }
 
 void Space::RemoveFree(std::map<std::uint64_t, std::uint64_t>::iterator oFree)
@@ -101,4 +144,4 @@ void Space::AddFree(std::uint64_t nOffset, std::uint64_t nBytes)
     moBySize.insert({nBytes, nOffset});
 }
 
-} // namespace krv::plugins::tif
+} // namespace krv::plugins::support
