@@ -34,3 +34,4 @@ install(FILES ${CMAKE_BINARY_DIR}/package/krvdatasources.pc DESTINATION lib/pkgc
 install(FILES ${CMAKE_SOURCE_DIR}/examples/formatplugin/CMakeLists.txt DESTINATION share/krv/formatplugin)
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/plugins/demo DESTINATION share/krv/formatplugin/plugins)
 install(DIRECTORY ${CMAKE_SOURCE_DIR}/docs DESTINATION share/krv)
+install(FILES ${CMAKE_SOURCE_DIR}/LICENSE DESTINATION share/krv)

@@ -27,6 +27,7 @@ expect()
 }
 
 quietly install cmake --install "$oBuild" --prefix "$oWork/first"
+quietly licence cmp "$oSource/LICENSE" "$oWork/first/share/krv/LICENSE"
 mv "$oWork/first" "$oHome"
 if grep -rIlF -e "$oSource" -e "$oBuild" -e "$oWork" "$oHome"; then
     echo "these files name the place where they were made" >&2
