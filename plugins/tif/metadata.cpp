@@ -9,7 +9,9 @@
 #include <array>
 #include <charconv>
 #include <cstring>
+#include <map>
 #include <string_view>
+#include <utility>
 
 namespace krv::plugins::tif
 {
@@ -166,20 +168,31 @@ std::string ItemKey(const krv::xml::Element& oItem)
     return domain.empty() || name.empty() ? name : domain + ":" + name;
 }
 
-std::string FromHex(const std::string& text)
+// No value for what are no such digits.
+std::optional<std::string> FromHex(std::string_view digits)
 {
-    const auto Digit = [](char nDigit)
+    std::string bytes(digits.size() / 2, '\0');
+    for (std::size_t nAt = 0; nAt < bytes.size(); ++nAt)
     {
-        const std::size_t nAt = std::string_view("0123456789abcdef").find(nDigit);
-        return nAt == std::string_view::npos ? 0u : static_cast<unsigned int>(nAt);
-    };
-    std::string bytes;
-    for (std::size_t nAt = 0; nAt + 1 < text.size(); nAt += 2)
-        bytes += static_cast<char>(Digit(text[nAt]) << 4 | Digit(text[nAt + 1]));
-    return bytes;
+        unsigned char nByte = 0;
+        const char* const pEnd = digits.data() + 2 * nAt + 2;
+        if (std::from_chars(pEnd - 2, pEnd, nByte, 16).ptr != pEnd)
+            return std::nullopt;
+        bytes[nAt] = static_cast<char>(nByte);
+    }
+    return digits.size() % 2 == 0 ? std::optional(bytes) : std::nullopt;
 }
 
-void ReadItems(TIFF* poTiff, AuxiliaryData& oData)
+// The item's key and its letter case take the place of what other tags say.
+void Put(krv::datasources::MetadataMap& oMap, const std::string& key, const std::string& value)
+{
+    const auto oFound = oMap.find(key);
+    if (oFound != oMap.end() && oFound->first != key)
+        oMap.erase(oFound);
+    oMap[key] = value;
+}
+
+void ReadItems(TIFF* poTiff, AuxiliaryData& oData, std::string* pTrouble)
 {
     const std::string text = ReadText(poTiff, TAG_METADATA);
     if (text.empty())
@@ -189,25 +202,34 @@ void ReadItems(TIFF* poTiff, AuxiliaryData& oData)
     {
         oRoot = krv::xml::ParseTree(text.data(), text.size(), std::string(TIFFFileName(poTiff)) + ", tag 42112");
     }
-    catch (const krv::DataException&)
+    catch (const krv::DataException& oException)
     {
         // Nothing is lost when another program wrote something else there.
+        if (pTrouble != nullptr)
+            *pTrouble = oException.what();
         return SetText(oData, "MetadataXML", text);
     }
+    std::map<unsigned int, krv::datasources::MetadataMap> oMaps;
     for (const krv::xml::Element& oItem : oRoot.children)
     {
-        const auto oKey = FindItemKey(oItem, oData.GetChannelCount());
+        const std::optional<MetadataKey> oKey = FindItemKey(oItem, oData.GetChannelCount());
         if (!oKey)
             continue;
-        const auto& [nChannel, key] = *oKey;
-        const std::string value = Attribute(oItem, "encoding") == "hex" ? FromHex(oItem.text) : oItem.text;
-        if (nChannel == 0)
-            oData.SetFileMetadataValue(key, value);
-        else if (key == "\nDescription")
+        const unsigned int nChannel = oKey->mnChannel;
+        const auto oBytes = Attribute(oItem, "encoding") == "hex" ? FromHex(oItem.text) : std::nullopt;
+        const std::string& value = oBytes ? *oBytes : oItem.text;
+        if (oKey->mbDescription)
             oData.SetChannelDescription(value, nChannel);
         else
-            oData.SetChanMetadataValue(key, value, nChannel);
+            Put(oMaps.try_emplace(nChannel, nChannel == 0 ? oData.GetFileMetadata() : oData.GetChanMetadata(nChannel))
+                    .first->second,
+                oKey->moKey, value);
     }
+    for (const auto& [nChannel, oMap] : oMaps)
+        if (nChannel == 0)
+            oData.SetFileMetadata(oMap);
+        else
+            oData.SetChanMetadata(oMap, nChannel);
 }
 
 } // namespace
@@ -219,27 +241,45 @@ std::string NumberText(double nValue)
     return std::string(aText.data(), oResult.ptr);
 }
 
-std::optional<std::pair<unsigned int, std::string>> FindItemKey(const krv::xml::Element& oItem, unsigned int nChannels)
+bool MetadataKey::operator<(const MetadataKey& oOther) const
 {
-    const std::optional<unsigned int> oChannel = ItemChannel(oItem, nChannels);
-    const std::string key = ItemKey(oItem);
-    if (oItem.name != "Item" || !oChannel || key.empty())
-        return std::nullopt;
-    if (*oChannel != 0 && Attribute(oItem, "role") == "description")
-        return std::pair(*oChannel, std::string("\nDescription"));
-    return std::pair(*oChannel, key);
+    if (mnChannel != oOther.mnChannel || mbDescription != oOther.mbDescription)
+        return std::pair(mnChannel, mbDescription) < std::pair(oOther.mnChannel, oOther.mbDescription);
+    return krv::datasources::detail::CaseInsensitiveCompare()(moKey, oOther.moKey);
 }
 
-bool IsItemText(const std::string& text)
+bool IsSameKey(const std::string& first, const std::string& second)
+{
+    const krv::datasources::detail::CaseInsensitiveCompare oLess;
+    return !oLess(first, second) && !oLess(second, first);
+}
+
+std::optional<MetadataKey> FindItemKey(const krv::xml::Element& oItem, unsigned int nChannels)
+{
+    const std::optional<unsigned int> oChannel = ItemChannel(oItem, nChannels);
+    if (oItem.name != "Item" || !oChannel)
+        return std::nullopt;
+    const std::string* const pDigits = oItem.FindAttribute("keyhex");
+    if (const auto oBytes = pDigits != nullptr ? FromHex(*pDigits) : std::nullopt)
+        return MetadataKey{*oChannel, *oBytes};
+    const std::string key = ItemKey(oItem);
+    if (key.empty())
+        return std::nullopt;
+    if (*oChannel != 0 && Attribute(oItem, "role") == "description")
+        return MetadataKey{*oChannel, {}, true};
+    return MetadataKey{*oChannel, key};
+}
+
+std::string WhyNoItems(const std::string& text)
 {
     try
     {
         krv::xml::ParseTree(text.data(), text.size(), "tag 42112");
-        return true;
+        return {};
     }
-    catch (const krv::DataException&)
+    catch (const krv::DataException& oException)
     {
-        return false;
+        return oException.what();
     }
 }
 
@@ -265,7 +305,7 @@ std::string ReadText(TIFF* poTiff, std::uint32_t nTag)
     return std::string(pText, strnlen(pText, bLong ? nCount : nShortCount));
 }
 
-AuxiliaryData ReadMetadata(Page& oPage)
+AuxiliaryData ReadMetadata(Page& oPage, std::string* pTrouble)
 {
     TIFF* poTiff = oPage.GetTiff();
     AuxiliaryData oData(oPage.GetForm().mnChannels);
@@ -274,7 +314,7 @@ AuxiliaryData ReadMetadata(Page& oPage)
     ReadResolution(poTiff, oData);
     SetText(oData, "Photometric", PhotometricText(oPage.GetForm().mnPhotometric));
     ReadGeography(poTiff, oData);
-    ReadItems(poTiff, oData);
+    ReadItems(poTiff, oData, pTrouble);
     return oData;
 }
 

@@ -1,21 +1,19 @@
 #include "plugins/tif/writing/metadataitems.h"
 
-#include "plugins/tif/metadata.h"
 #include "toolkit/xml/xmltree.h"
 
+#include <algorithm>
 #include <cstdint>
+#include <optional>
 #include <string_view>
 #include <vector>
 
 namespace krv::plugins::tif
 {
 
-const std::string DESCRIPTION_KEY = "\nDescription";
-
 namespace
 {
 
-using krv::datasources::AuxiliaryData;
 using krv::xml::Element;
 
 constexpr const char* ROOT = "GDALMetadata";
@@ -31,8 +29,7 @@ struct Role
 constexpr Role ROLES[] = {{"Scale", "SCALE", "scale"},
                           {"Offset", "OFFSET", "offset"},
                           {"UnitType", "UNITTYPE", "unittype"},
-                          {"ColorInterp", "COLORINTERP", "colorinterp"},
-                          {"\nDescription", "DESCRIPTION", "description"}};
+                          {"ColorInterp", "COLORINTERP", "colorinterp"}};
 
 // Length of the character of UTF-8 at a place; 0 when there is none that XML takes.
 std::size_t CharacterBytes(std::string_view text, std::size_t nAt)
@@ -58,14 +55,30 @@ std::size_t CharacterBytes(std::string_view text, std::size_t nAt)
 
 bool IsXmlText(std::string_view text)
 {
+    std::size_t nBytes = 1;
+    for (std::size_t nAt = 0; nAt < text.size() && nBytes != 0; nAt += nBytes)
+        nBytes = CharacterBytes(text, nAt);
+    return nBytes != 0;
+}
+
+// The text as far as XML can hold it, for programs that know nothing of its bytes: what is no UTF-8 is taken for
+// Latin-1.
+std::string MakeLikeness(std::string_view text)
+{
+    std::string likeness;
     for (std::size_t nAt = 0; nAt < text.size();)
     {
         const std::size_t nBytes = CharacterBytes(text, nAt);
-        if (nBytes == 0)
-            return false;
-        nAt += nBytes;
+        const auto nByte = static_cast<unsigned char>(text[nAt]);
+        if (nBytes != 0)
+            likeness += text.substr(nAt, nBytes);
+        else if (nByte >= 0x80)
+            likeness.append({static_cast<char>(0xC0 | nByte >> 6), static_cast<char>(0x80 | (nByte & 0x3F))});
+        else
+            likeness += '?';
+        nAt += std::max<std::size_t>(nBytes, 1);
     }
-    return true;
+    return likeness;
 }
 
 std::string Escape(std::string_view text, bool bAttribute)
@@ -140,65 +153,60 @@ void SetText(Element& oItem, const std::string& value)
 
 Element MakeItem(const MetadataKey& oKey, const std::string& value)
 {
-    const auto& [nChannel, key] = oKey;
     Element oItem;
     oItem.name = "Item";
-    std::string name = key;
-    std::string role;
+    std::string name = oKey.mbDescription ? "DESCRIPTION" : MakeLikeness(oKey.moKey);
+    std::string role = oKey.mbDescription ? "description" : "";
     for (const Role& oRole : ROLES)
-        if (nChannel != 0 && key == oRole.mpKey)
+        if (oKey.mnChannel != 0 && !oKey.mbDescription && IsSameKey(oKey.moKey, oRole.mpKey))
             name = oRole.mpName, role = oRole.mpRole;
     const std::size_t nColon = name.find(':');
     const bool bDomain = nColon != std::string::npos && nColon > 0 && nColon + 1 < name.size();
     SetAttribute(oItem, "name", bDomain ? name.substr(nColon + 1) : name);
     if (bDomain)
         SetAttribute(oItem, "domain", name.substr(0, nColon));
-    if (nChannel != 0)
-        SetAttribute(oItem, "sample", std::to_string(nChannel - 1));
+    if (oKey.mnChannel != 0)
+        SetAttribute(oItem, "sample", std::to_string(oKey.mnChannel - 1));
     SetAttribute(oItem, "role", role);
+    const std::optional<MetadataKey> oSaid = FindItemKey(oItem, oKey.mnChannel);
+    if (!oSaid || oSaid->moKey != oKey.moKey)
+        oItem.attributes.emplace_back("keyhex", ToHex(oKey.moKey));
     SetText(oItem, value);
     return oItem;
 }
 
-std::string GetValue(const AuxiliaryData& oData, const MetadataKey& oKey)
-{
-    if (oKey.first == 0)
-        return oData.GetFileMetadataValue(oKey.second);
-    return oKey.second == DESCRIPTION_KEY ? oData.GetChannelDescription(oKey.first)
-                                          : oData.GetChanMetadataValue(oKey.second, oKey.first);
-}
-
 } // namespace
 
-std::string EditItems(const std::string& text, const AuxiliaryData& oNew, const std::set<MetadataKey>& oChanged,
-                      const std::set<MetadataKey>& oElsewhere)
+std::string EditItems(const std::string& text, const std::map<MetadataKey, std::string>& oWanted,
+                      unsigned int nChannels)
 {
     Element oRoot;
     oRoot.name = ROOT;
     if (!text.empty())
         oRoot = krv::xml::ParseTree(text.data(), text.size(), "tag 42112");
-    std::set<MetadataKey> oMissing = oChanged;
+    std::map<MetadataKey, std::string> oMissing = oWanted;
+    std::erase_if(oMissing, [](const auto& oPair) { return oPair.second.empty(); });
     std::vector<Element> oKept;
     for (Element& oItem : oRoot.children)
     {
-        const std::optional<MetadataKey> oKey = FindItemKey(oItem, oNew.GetChannelCount());
-        if (!oKey || !oChanged.contains(*oKey))
+        const std::optional<MetadataKey> oKey = FindItemKey(oItem, nChannels);
+        if (!oKey || !oWanted.contains(*oKey))
         {
             oKept.push_back(std::move(oItem));
             continue;
         }
-        const std::string value = oElsewhere.contains(*oKey) ? std::string() : GetValue(oNew, *oKey);
-        if (value.empty() || oMissing.erase(*oKey) == 0)
+        const auto oFound = oMissing.find(*oKey);
+        if (oFound == oMissing.end())
             continue;
-        SetText(oItem, value);
+        if (oFound->first.moKey == oKey->moKey)
+            SetText(oItem, oFound->second);
+        else
+            oItem = MakeItem(oFound->first, oFound->second);
         oKept.push_back(std::move(oItem));
+        oMissing.erase(oFound);
     }
-    for (const MetadataKey& oKey : oMissing)
-    {
-        const std::string value = oElsewhere.contains(oKey) ? std::string() : GetValue(oNew, oKey);
-        if (!value.empty())
-            oKept.push_back(MakeItem(oKey, value));
-    }
+    for (const auto& [oKey, value] : oMissing)
+        oKept.push_back(MakeItem(oKey, value));
     oRoot.children = std::move(oKept);
     if (oRoot.children.empty() && oRoot.name == ROOT)
         return {};

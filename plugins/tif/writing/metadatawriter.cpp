@@ -1,12 +1,13 @@
 #include "plugins/tif/writing/metadatawriter.h"
 
-#include "plugins/tif/metadata.h"
+#include "plugins/tif/writing/metadataitems.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
 #include <array>
 #include <charconv>
 #include <cmath>
+#include <map>
 #include <optional>
 #include <sstream>
 #include <string_view>
@@ -29,6 +30,8 @@ constexpr std::uint16_t TAG_RPC = 50844;
 constexpr std::size_t RPC_VALUES = 92;
 constexpr std::size_t DATE_CHARACTERS = 19;
 constexpr std::size_t MAXIMUM_XMP_BYTES = std::size_t{1} << 20;
+// Eleven such texts, the items and what else a page has stay below what is read of one.
+constexpr std::size_t MAXIMUM_TEXT_BYTES = std::size_t{6} << 20;
 constexpr std::size_t POINT_VALUES = 5;
 
 struct TextTag
@@ -87,26 +90,34 @@ void MetadataWriter::Write(const AuxiliaryData& oNew, const Place& oPlace)
     FindChanges(oOld, oNew);
     const MetadataKey oUnit{0, "ResolutionUnit"};
     for (const MetadataKey& oKey : moChanged)
-        if (oKey.first == 0 && oKey != oUnit && StoreInTag(oKey.second, oNew.GetFileMetadataValue(oKey.second)))
-            moElsewhere.insert(oKey);
+        if (oKey.mnChannel == 0 && StoreInTag(oKey.moKey, oNew.GetFileMetadataValue(oKey.moKey)))
+            SayElsewhere(oKey);
     // It goes with the resolutions, which come first.
-    if (moChanged.contains(oUnit) && StoreUnit(oNew.GetFileMetadataValue(oUnit.second)))
-        moElsewhere.insert(oUnit);
+    if (moChanged.contains(oUnit) && StoreUnit(oNew.GetFileMetadataValue(oUnit.moKey)))
+        SayElsewhere(oUnit);
     StoreColours(oNew);
-    StoreItems(oNew);
+    StoreItems(oNew, oPlace);
+}
+
+void MetadataWriter::SayElsewhere(const MetadataKey& oKey)
+{
+    const auto oFound = moChanged.find(oKey);
+    if (oFound != moChanged.end() && oFound->moKey == oKey.moKey)
+        moElsewhere.insert(oKey);
 }
 
 void MetadataWriter::Compare(unsigned int nChannel, const MetadataMap& oOld, const MetadataMap& oNew)
 {
-    const auto Value = [](const MetadataMap& oMap, const std::string& key)
+    for (const auto& [key, value] : oOld)
+        if (!value.empty() && !oNew.contains(key))
+            moChanged.insert({nChannel, key});
+    for (const auto& [key, value] : oNew)
     {
-        const auto oFound = oMap.find(key);
-        return oFound == oMap.end() ? std::string() : oFound->second;
-    };
-    for (const MetadataMap* pMap : {&oOld, &oNew})
-        for (const auto& [key, value] : *pMap)
-            if (Value(oOld, key) != Value(oNew, key) && !key.empty())
-                moChanged.insert({nChannel, key});
+        const auto oFound = oOld.find(key);
+        const bool bOther = oFound != oOld.end() && (oFound->second != value || oFound->first != key);
+        if (bOther || (oFound == oOld.end() && !value.empty()))
+            moChanged.insert({nChannel, key});
+    }
 }
 
 void MetadataWriter::FindChanges(const AuxiliaryData& oOld, const AuxiliaryData& oNew)
@@ -116,49 +127,46 @@ void MetadataWriter::FindChanges(const AuxiliaryData& oOld, const AuxiliaryData&
     {
         Compare(nChannel, oOld.GetChanMetadata(nChannel), oNew.GetChanMetadata(nChannel));
         if (oOld.GetChannelDescription(nChannel) != oNew.GetChannelDescription(nChannel))
-            moChanged.insert({nChannel, DESCRIPTION_KEY});
+            moChanged.insert({nChannel, {}, true});
     }
 }
 
 bool MetadataWriter::StoreInTag(const std::string& key, const std::string& value)
 {
-    if (key == "XResolution")
+    for (const TextTag& oText : TEXTS)
+        if (IsSameKey(key, oText.mpKey))
+            return StoreText(oText.mnTag, value);
+    if (IsSameKey(key, "XResolution"))
         return StoreResolution(TIFFTAG_XRESOLUTION, value);
-    if (key == "YResolution")
+    if (IsSameKey(key, "YResolution"))
         return StoreResolution(TIFFTAG_YRESOLUTION, value);
-    if (key == "Orientation")
+    if (IsSameKey(key, "Orientation"))
         return StoreNumber(TIFFTAG_ORIENTATION, value, 2, 8);
-    if (key == "Photometric")
+    if (IsSameKey(key, "Photometric"))
         return StorePhotometric(value);
-    if (key == "RasterType")
+    if (IsSameKey(key, "RasterType"))
         return StoreRasterType(value);
-    if (key == "RPC")
+    if (IsSameKey(key, "RPC"))
         return StoreRpc(value);
-    if (key == "GroundControlPoints")
+    if (IsSameKey(key, "GroundControlPoints"))
         return StorePoints(value);
-    return StoreText(key, value);
+    return false;
 }
 
-bool MetadataWriter::StoreText(const std::string& key, const std::string& value)
+bool MetadataWriter::StoreText(std::uint16_t nTag, const std::string& value)
 {
-    for (const TextTag& oText : TEXTS)
+    const bool bDate = nTag == TIFFTAG_DATETIME && !value.empty() && value.size() != DATE_CHARACTERS;
+    const bool bLong = value.size() > (nTag == TIFFTAG_XMLPACKET ? MAXIMUM_XMP_BYTES : MAXIMUM_TEXT_BYTES);
+    if (bDate || bLong || value.find('\0') != std::string::npos)
     {
-        if (key != oText.mpKey)
-            continue;
-        const bool bDate = oText.mnTag == TIFFTAG_DATETIME && !value.empty() && value.size() != DATE_CHARACTERS;
-        const bool bLong = oText.mnTag == TIFFTAG_XMLPACKET && value.size() > MAXIMUM_XMP_BYTES;
-        if (bDate || bLong || value.find('\0') != std::string::npos)
-        {
-            mpoPage->moTags.Remove(oText.mnTag);
-            return false;
-        }
-        if (oText.mnTag == TIFFTAG_XMLPACKET && !value.empty())
-            mpoPage->moTags.SetBytes(oText.mnTag, TIFF_BYTE, value);
-        else
-            mpoPage->moTags.SetText(oText.mnTag, value);
-        return true;
+        mpoPage->moTags.Remove(nTag);
+        return false;
     }
-    return false;
+    if (nTag == TIFFTAG_XMLPACKET && !value.empty())
+        mpoPage->moTags.SetBytes(nTag, TIFF_BYTE, value);
+    else
+        mpoPage->moTags.SetText(nTag, value);
+    return true;
 }
 
 // A fraction that gives the same number as the text: whole, or over a power of two or ten.
@@ -345,20 +353,22 @@ void MetadataWriter::NoteColours(const AuxiliaryData& oNew)
     const AuxiliaryData oSaid = ReadMetadata(*moEditor.OpenPage(mpoPage));
     for (const MetadataKey& oKey : moChanged)
     {
-        const auto& [nChannel, key] = oKey;
-        if (nChannel == 0 && key == "Photometric" && oSaid.GetFileMetadataValue(key) == oNew.GetFileMetadataValue(key))
-            moElsewhere.insert(oKey);
-        if (nChannel != 0 && key == "ColorInterp" &&
+        const auto& [nChannel, key, bDescription] = oKey;
+        if (nChannel == 0 && IsSameKey(key, "Photometric") &&
+            oSaid.GetFileMetadataValue(key) == oNew.GetFileMetadataValue(key))
+            SayElsewhere({0, "Photometric"});
+        if (nChannel != 0 && IsSameKey(key, "ColorInterp") &&
             oSaid.GetChanMetadataValue(key, nChannel) == oNew.GetChanMetadataValue(key, nChannel))
-            moElsewhere.insert(oKey);
+            SayElsewhere({nChannel, "ColorInterp"});
     }
 }
 
 void MetadataWriter::StoreColours(const AuxiliaryData& oNew)
 {
-    const bool bColours = std::any_of(moChanged.begin(), moChanged.end(),
-                                      [](const MetadataKey& oKey)
-                                      { return oKey.second == "ColorInterp" || oKey.second == "Photometric"; });
+    const bool bColours =
+        std::any_of(moChanged.begin(), moChanged.end(),
+                    [](const MetadataKey& oKey)
+                    { return IsSameKey(oKey.moKey, "ColorInterp") || IsSameKey(oKey.moKey, "Photometric"); });
     if (bColours)
     {
         const std::uint64_t nOld = mpoPage->moTags.GetNumber(TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
@@ -374,25 +384,40 @@ void MetadataWriter::StoreColours(const AuxiliaryData& oNew)
             continue;
         if (StoreAlpha(nChannel, oNew.GetChanMetadataValue("ColorInterp", nChannel),
                        oNew.GetChanMetadataValue("AlphaKind", nChannel)))
-            moElsewhere.insert({oColour, oKind});
+        {
+            SayElsewhere(oColour);
+            SayElsewhere(oKind);
+        }
     }
 }
 
-void MetadataWriter::StoreItems(const AuxiliaryData& oNew)
+void MetadataWriter::StoreItems(const AuxiliaryData& oNew, const Place& oPlace)
 {
     if (moChanged.empty())
         return;
     // A text that is no XML was handed out as a value of its own and is taken back the same way.
     const std::string text = ReadText(moEditor.OpenPage(mpoPage)->GetTiff(), TAG_METADATA);
-    const bool bForeign = !text.empty() && !IsItemText(text);
-    if (bForeign && oNew.GetFileMetadataValue("MetadataXML") == text && moChanged == moElsewhere)
+    const bool bForeign = !text.empty() && !WhyNoItems(text).empty();
+    if (bForeign && oNew.GetFileMetadataValue("MetadataXML") == text && moChanged.size() == moElsewhere.size())
         return;
-    std::set<MetadataKey> oChanged = moChanged;
+    std::map<MetadataKey, std::string> oWanted;
+    for (const MetadataKey& oKey : moChanged)
+        if (oKey.mbDescription)
+            oWanted[oKey] = oNew.GetChannelDescription(oKey.mnChannel);
+        else if (moElsewhere.contains(oKey))
+            oWanted[oKey] = {};
+        else
+            oWanted[oKey] = oKey.mnChannel == 0 ? oNew.GetFileMetadataValue(oKey.moKey)
+                                                : oNew.GetChanMetadataValue(oKey.moKey, oKey.mnChannel);
     if (bForeign)
-        oChanged.insert({0, "MetadataXML"});
-    const std::string edited = EditItems(bForeign ? std::string() : text, oNew, oChanged, moElsewhere);
-    if (edited != text)
-        mpoPage->moTags.SetText(TAG_METADATA, edited);
+        oWanted[{0, "MetadataXML"}] = oNew.GetFileMetadataValue("MetadataXML");
+    const std::string edited = EditItems(bForeign ? std::string() : text, oWanted, oNew.GetChannelCount());
+    if (edited == text)
+        return;
+    const std::string why = edited.empty() ? std::string() : WhyNoItems(edited);
+    if (!why.empty())
+        throw DataException(moEditor.GetFileName() + ": the metadata are more than can be read again: " + why, oPlace);
+    mpoPage->moTags.SetText(TAG_METADATA, edited);
 }
 
 } // namespace krv::plugins::tif

@@ -379,11 +379,22 @@ TEST(TifUpdate, MetadataComeBackByteForByteAndForeignItemsStay)
                                                       {"a:b:c", "domain"},
                                                       {"Quoted \"'<&>\n\t\r", " \n\t\r <&>\"' \xC3\xA4 "},
                                                       {"Latin", "\xE4\x01\xFF"},
+                                                      {"Stra\xDF"
+                                                       "e:B\xFCrgel",
+                                                       "of Latin-1"},
+                                                      {"bell\a", "\xEF\xBF\xBE"},
+                                                      {"\xEF\xBF\xBE \xED\xA0\x80", "no characters"},
+                                                      {"", "without a name"},
+                                                      {std::string("nul\0", 4), std::string("l\0l", 3)},
+                                                      {std::string(1U << 20U, '\xE4'), std::string(3U << 20U, 'x')},
+                                                      {"copyright", "in a case of its own"},
                                                       {"RPC", "not numbers"}};
     for (const auto& [key, value] : oFile)
         oData.SetFileMetadataValue(key, value);
     oData.SetChanMetadataValue("Scale", "0.1", 2);
     oData.SetChanMetadataValue("Own", "x", 3);
+    oData.SetChanMetadataValue("scale", "7", 3);
+    oData.SetChanMetadata({{"colorinterp", "Red"}, {"\nDescription", "a key"}}, 1);
     oData.SetChannelDescription("near infrared", 3);
     oData.SetChanMetadataValue("ColorInterp", "NIR", 3);
     poDataset->WriteAuxiliaryData(oData);
@@ -391,14 +402,26 @@ TEST(TifUpdate, MetadataComeBackByteForByteAndForeignItemsStay)
     const auto Check = [&](const AuxiliaryData& oRead)
     {
         for (const auto& [key, value] : oFile)
-            EXPECT_EQ(oRead.GetFileMetadataValue(key), value) << key;
+        {
+            const auto oFound = oRead.GetFileMetadata().find(key);
+            ASSERT_NE(oFound, oRead.GetFileMetadata().end()) << key.substr(0, 99);
+            EXPECT_TRUE(*oFound == std::pair(key, value)) << key.substr(0, 99);
+        }
         for (unsigned int nChannel = 1; nChannel <= 4; ++nChannel)
         {
-            EXPECT_EQ(oRead.GetChanMetadata(nChannel), oData.GetChanMetadata(nChannel)) << nChannel;
+            const auto &oGot = oRead.GetChanMetadata(nChannel), &oWanted = oData.GetChanMetadata(nChannel);
+            EXPECT_TRUE(std::equal(oGot.begin(), oGot.end(), oWanted.begin(), oWanted.end())) << nChannel;
             EXPECT_EQ(oRead.GetChannelDescription(nChannel), oData.GetChannelDescription(nChannel));
         }
     };
     Check(OpenTif(fileName)->ReadAuxiliaryData());
+    const std::string bytes = ReadFile(fileName); // other programs see what is ordinary, and a likeness of the rest
+    for (const char* pItem :
+         {"<Item name=\"Own\" sample=\"2\">x<", "<Item name=\"SCALE\" sample=\"1\" role=\"scale\">0.1<",
+          "<Item name=\"B\xC3\xBCrgel\" domain=\"Stra\xC3\x9F"
+          "e\" keyhex=",
+          "in a case of its own\0"})
+        EXPECT_NE(bytes.find(pItem), std::string::npos) << pItem;
     poDataset = OpenTif(fileName, eUpdate);
     Check(poDataset->ReadAuxiliaryData());
     oData.RemoveFileMetadataValue("Software");
@@ -408,6 +431,17 @@ TEST(TifUpdate, MetadataComeBackByteForByteAndForeignItemsStay)
     EXPECT_EQ(OpenTif(fileName)->ReadAuxiliaryData().GetFileMetadataValue("Software"), "");
     EXPECT_EQ(OpenTif(fileName)->ReadAuxiliaryData().GetChanMetadataValue("Own", 3), "y");
     EXPECT_THROW(poDataset->WriteAuxiliaryData(AuxiliaryData(1)), krv::DataException);
+    oData.SetFileMetadata({{"SOFTWARE", "other"}, {"a:B:c", "moved"}});
+    poDataset->WriteAuxiliaryData(oData);
+    for (const char* pValue : {"SOFTWARE=other", "a:B:c=moved"})
+    {
+        const AuxiliaryData oRead = poDataset->ReadAuxiliaryData();
+        const auto oFound = oRead.GetFileMetadata().find(std::string(pValue).substr(0, std::string(pValue).find('=')));
+        ASSERT_NE(oFound, oRead.GetFileMetadata().end());
+        EXPECT_EQ(oFound->first + "=" + oFound->second, pValue);
+    }
+    oData.SetFileMetadataValue("Too long", std::string(17U << 20U, 'x'));
+    EXPECT_THROW(poDataset->WriteAuxiliaryData(oData), krv::DataException);
     EXPECT_EQ(Judge(fileName).moComplaints, "");
 }
 
