@@ -21,6 +21,9 @@
 #include "toolkit/ogc/cs/icrs.h"
 
 #include <algorithm>
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
 #include <functional>
 #include <memory>
 #include <vector>
@@ -35,6 +38,8 @@ using namespace krv::datasources;
 
 constexpr std::size_t MAX_CHANNELS = 4;
 constexpr unsigned int MAX_TILE = 256;
+
+std::uint64_t snSystems = 0;
 
 // One question; a refusal is as good an answer as any.
 void Ask(const std::function<void()>& oQuestion)
@@ -100,6 +105,11 @@ void ExerciseDisplay(IDataset& oDataset)
 
 } // namespace
 
+void ReportSystems()
+{
+    std::atexit([] { std::fprintf(stderr, "stat::reference_systems:          %llu\n", 0ull + snSystems); });
+}
+
 void ExerciseDescription(IDataset& oDataset)
 {
     Ask(
@@ -119,8 +129,8 @@ void ExerciseDescription(IDataset& oDataset)
         [&]
         {
             const std::unique_ptr<krv::ogc::cs::ICRS> oSystem(oDataset.ReadCRS());
-            if (oSystem)
-                oSystem->GetWKT();
+            if (oSystem && !oSystem->GetWKT().empty())
+                ++snSystems;
         });
     Ask(
         [&]

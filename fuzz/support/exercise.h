@@ -17,4 +17,7 @@ void ExerciseFile(const std::string& fileName);
 // Its tags, reference system, geocoding, colour tables: no pixels.
 void ExerciseDescription(krv::datasources::IDataset& oDataset);
 
+// At the end of the program, says how many reference systems the files had: a search that finds none tries nothing.
+void ReportSystems();
+
 } // namespace krv::fuzz

@@ -7,7 +7,7 @@ namespace krv::gobs
 {
 
 // As MaskDecision, for values that a double cannot hold: 64-bit integers are compared exactly. On request a NaN sample
-// of a listed channel of real type is background too, whatever the channel's value.
+// of a listed channel of real type, both parts of a complex one, is background too, whatever the channel's value.
 class KRV_GOBS_API ExactMaskDecision : public IMaskDecision
 {
 public:
