@@ -89,11 +89,12 @@ void StrileDecoder::DecodeByLibrary(std::uint32_t nStrile, unsigned char* pRaw, 
 void StrileDecoder::Decode(std::uint32_t nStrile, std::uint32_t nStoredRows, unsigned char* pRaw, std::size_t nRaw,
                            const WantedPixels& oWanted)
 {
+    // All of it is decoded, rows below the image too: damage may show at the end alone.
     const bool bOwn = moForm.IsOwnCodec();
     const std::size_t nStoredPitch = moForm.GetStoredRowBytes(moForm.mnStrileWidth);
-    const std::size_t nBytes = nStoredPitch * (bOwn ? oWanted.mnRows : nStoredRows);
+    const std::size_t nBytes = nStoredPitch * nStoredRows;
     const bool bDirect = moForm.moSample.meWidening == Widening::eNone && oWanted.mnPitch == nStoredPitch &&
-                         oWanted.mnWidth == moForm.mnStrileWidth && (bOwn || oWanted.mnRows == nStoredRows);
+                         oWanted.mnWidth == moForm.mnStrileWidth && oWanted.mnRows == nStoredRows;
     // Before a predictor, memory that stays in the processor's caches takes what the codec writes and reads again; the
     // target is then written once.
     const bool bPassing = bOwn && moForm.mnPredictor != PREDICTOR_NONE && nBytes <= KEPT_SCRATCH_BYTES;
@@ -108,6 +109,9 @@ void StrileDecoder::Decode(std::uint32_t nStrile, std::uint32_t nStoredRows, uns
     const codec::Result oResult = DecodeOwn(pRaw, nRaw, pStored, nBytes);
     if (!oResult.IsDone())
         moPage.Fail(Describe(nStrile) + ": " + codec::StatusText(oResult.moStatus));
+    const bool bLastStrip = !moForm.mbTiled && (nStrile + 1) % moForm.mnStrilesDown == 0;
+    if (oResult.mbMore && !bLastStrip)
+        moPage.Fail(Describe(nStrile) + ": the data give more than it holds");
     if (moForm.mnPredictor != PREDICTOR_NONE)
         return UndoPredictor(pStored, nStoredPitch, moForm.mnStrileWidth, oWanted);
     Finish(pStored, nStoredPitch, GetOrder() == codec::SampleOrder::eSwapped, oWanted);

@@ -254,7 +254,7 @@ void StrileSource::ReadCoded(const Piece& oPiece, const Strile& oStrile)
     if (oStrile.mnOffset >= nSize)
         mpoPage->Fail(moDecoder.Describe(oPiece.mnStrile) + ": the file is truncated: it lies behind the end");
     // No coding makes data several times as long: more than that is not read.
-    const std::uint64_t nStored = std::uint64_t{oPiece.mnStoredRows} * moForm.GetStoredRowBytes(moForm.mnStrileWidth);
+    const std::uint64_t nStored = std::uint64_t{moForm.mnStrileHeight} * moForm.GetStoredRowBytes(moForm.mnStrileWidth);
     const std::uint64_t nMost = std::min<std::uint64_t>(nStored + nStored / 8 + AHEAD_BYTES, nSize - oStrile.mnOffset);
     Strile oRaw = oStrile;
     oRaw.mnBytes = oStrile.mbBytesKnown ? std::min(oStrile.mnBytes, nMost) : nMost;

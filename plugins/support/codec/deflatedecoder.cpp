@@ -32,52 +32,64 @@ unsigned int TakePart(std::size_t& nLeft)
     return nPart;
 }
 
-Status FromZlib(int nCode, std::size_t nInputLeft)
+Status FromZlib(int nCode)
 {
-    if (nCode == Z_MEM_ERROR)
-        return Status::eNoMemory;
-    const bool bEnded = nCode == Z_STREAM_END || (nCode == Z_BUF_ERROR && nInputLeft == 0);
-    return bEnded ? Status::eTruncated : Status::eCorrupt;
-}
-
-// Goes on behind the last byte that is wanted, to the check sum: in vain for as many bytes again, but not for ever.
-int ReadOn(z_stream& oStream, std::size_t nMore)
-{
-    std::array<unsigned char, 4096> oUnwanted;
-    int nCode = Z_OK;
-    for (std::size_t i = 0; nCode == Z_OK && i <= nMore; i += oUnwanted.size())
+    switch (nCode)
     {
-        oStream.next_out = oUnwanted.data();
-        oStream.avail_out = oUnwanted.size();
-        nCode = inflate(&oStream, Z_NO_FLUSH);
+    case Z_MEM_ERROR:
+        return Status::eNoMemory;
+    case Z_STREAM_END:
+    case Z_BUF_ERROR:
+        return Status::eTruncated;
+    default:
+        return Status::eCorrupt;
     }
-    return nCode;
 }
 
-// Piece by piece, as far as the stream goes: says how many bytes are good, and stops when the output is full.
+// Piece by piece, as far as the stream goes: says how many bytes are good. Goes on behind the last byte that is wanted,
+// to the check sum, but not for ever.
 Result Inflate(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput)
 {
+    constexpr std::size_t ENOUGH = std::size_t{1} << 20;
+    constexpr int LAST_PART = 64; // of what zlib says in data_type
+    constexpr int BETWEEN_PARTS = 128;
     z_stream oStream{};
     if (inflateInit(&oStream) != Z_OK)
         return {Status::eNoMemory, 0};
+    std::array<unsigned char, 4096> oUnwanted;
     oStream.next_in = const_cast<unsigned char*>(input);
     oStream.next_out = output;
     std::size_t nInputLeft = nInput;
     std::size_t nOutputLeft = nOutput;
+    bool bOnlyEndMark = true; // of what may still follow once the output is full
     int nCode = Z_OK;
-    while (nCode == Z_OK && (oStream.avail_out > 0 || nOutputLeft > 0))
+    while (nCode == Z_OK && oStream.total_out <= nOutput + nOutput + ENOUGH)
     {
         if (oStream.avail_in == 0)
             oStream.avail_in = TakePart(nInputLeft);
-        if (oStream.avail_out == 0)
+        if (oStream.avail_out == 0 && nOutputLeft > 0)
             oStream.avail_out = TakePart(nOutputLeft);
-        nCode = inflate(&oStream, Z_NO_FLUSH);
+        else if (oStream.avail_out == 0)
+        {
+            oStream.next_out = oUnwanted.data();
+            oStream.avail_out = oUnwanted.size();
+        }
+        nCode = inflate(&oStream, Z_BLOCK);
+        const bool bBetween = (oStream.data_type & BETWEEN_PARTS) != 0;
+        if (bBetween && oStream.total_out >= nOutput)
+            bOnlyEndMark = (oStream.data_type & LAST_PART) != 0 || oStream.avail_in + nInputLeft == 0;
+        if (bBetween && nCode == Z_BUF_ERROR)
+            nCode = Z_OK;
     }
-    const auto nBytes = static_cast<std::size_t>(oStream.next_out - output);
-    nCode = nCode == Z_OK ? ReadOn(oStream, nOutput) : nCode;
-    const Status oFault = FromZlib(nCode, oStream.avail_in + nInputLeft);
+    const std::size_t nGiven = oStream.total_out;
     inflateEnd(&oStream);
-    return {nBytes == nOutput && nCode != Z_DATA_ERROR ? Status::eDone : oFault, nBytes};
+    if (nGiven < nOutput)
+        return {FromZlib(nCode), nGiven};
+    if (nCode == Z_STREAM_END || (nCode == Z_BUF_ERROR && nGiven == nOutput && bOnlyEndMark))
+        return {Status::eDone, nOutput};
+    if (nCode == Z_OK)
+        return {Status::eDone, nOutput, true};
+    return {nCode == Z_MEM_ERROR ? Status::eNoMemory : Status::eCorrupt, nOutput};
 }
 
 } // namespace

@@ -17,9 +17,9 @@ public:
     DeflateDecoder(DeflateDecoder&&) noexcept;
     DeflateDecoder& operator=(DeflateDecoder&&) noexcept;
 
-    // Decodes one block into at most nOutput bytes. A stream that would give more fills the output and counts as done,
-    // and so does one that lacks its check sum; a wrong check sum means corrupt. Bytes behind the end of the stream are
-    // ignored.
+    // Decodes one block into at most nOutput bytes, and on to the end of the stream: a wrong check sum means corrupt,
+    // also that of a stream that gives more. A whole block whose end mark alone is cut off (check sum, end code, an
+    // empty last part) counts as done. Bytes behind the end of the stream are ignored.
     Result Decode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput);
 
 private:

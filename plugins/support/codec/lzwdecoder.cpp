@@ -81,10 +81,28 @@ public:
             if (mpoOut < mpoEnd && !Step())
                 break;
         }
-        return {mpoOut < mpoEnd ? moFault : Status::eDone, static_cast<std::size_t>(mpoOut - mpoStart)};
+        if (mpoOut < mpoEnd)
+            return {moFault, static_cast<std::size_t>(mpoOut - mpoStart)};
+        return {Status::eDone, static_cast<std::size_t>(mpoEnd - mpoStart), HasMore()};
     }
 
 private:
+    // Bits that writers without an end code, or with one of another width, may leave at the end.
+    static constexpr std::uint64_t PADDING = 24;
+
+    // Whether strings follow once the output is full.
+    bool HasMore()
+    {
+        while (mnInput * 8 - mnBit >= PADDING)
+        {
+            const unsigned int nCode = ReadCode();
+            if (nCode != CLEAR)
+                return nCode != END;
+            Clear();
+        }
+        return false;
+    }
+
     // The number of entries at which codes become one bit wider.
     static constexpr unsigned int GetLimit(unsigned int nWidth)
     {

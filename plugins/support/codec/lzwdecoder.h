@@ -21,7 +21,7 @@ public:
     LzwDecoder& operator=(LzwDecoder&&) noexcept;
 
     // Decodes one block into exactly nOutput bytes. Either edition is recognised by itself.
-    // Stops without looking further once the output is full; a missing end code is no fault then.
+    // A missing end code is no fault once the output is full.
     // Any input is safe: nothing outside of the two buffers is read or written.
     Result Decode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput);
 

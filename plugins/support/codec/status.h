@@ -8,7 +8,7 @@ namespace krv::plugins::codec
 // How the decoding of one block ended.
 enum class Status
 {
-    eDone,      // the output is full; input that would give more was left alone
+    eDone,      // the output is full and nothing was found wrong up to the end of the coded data
     eTruncated, // the input ended, with or without its end mark, before the output was full
     eCorrupt,   // the input breaks the rules of its coding
     eNoMemory   // the codec could not get its working memory
@@ -23,6 +23,9 @@ struct Result
 {
     Status moStatus = Status::eDone;
     std::size_t mnBytes = 0;
+    // Done, but the input would give more than the output holds, and no check sum vouches for it. Some writers fill the
+    // last strip of an image up to its nominal height; elsewhere it is a sign of damage.
+    bool mbMore = false;
 
     bool IsDone() const { return moStatus == Status::eDone; }
 };

@@ -3,6 +3,8 @@
 #include <zstd.h>
 #include <zstd_errors.h>
 
+#include <array>
+
 namespace krv::plugins::codec
 {
 
@@ -26,23 +28,32 @@ Status FromZstd(std::size_t nCode)
     return ZSTD_getErrorCode(nCode) == ZSTD_error_memory_allocation ? Status::eNoMemory : Status::eCorrupt;
 }
 
-// Piece by piece: says how many bytes are good. Goes on after the output is full until nothing moves any more, since
-// the check sum of the frame may follow.
+// Piece by piece: says how many bytes are good. Goes on behind the last byte that is wanted to the end of the frame,
+// where its check sum may be, but not for ever.
 Result DecodeStream(ZSTD_DCtx* context, const unsigned char* input, std::size_t nInput, unsigned char* output,
                     std::size_t nOutput)
 {
+    constexpr std::size_t ENOUGH = std::size_t{1} << 20;
+    std::array<unsigned char, 4096> oUnwanted;
     ZSTD_inBuffer oInput{input, nInput, 0};
     ZSTD_outBuffer oOutput{output, nOutput, 0};
     ZSTD_DCtx_reset(context, ZSTD_reset_session_only);
     std::size_t nCode = 1;
-    std::size_t nBefore = nInput + nOutput;
-    while (nCode != 0 && ZSTD_isError(nCode) == 0 && nBefore != oInput.pos + oOutput.pos)
+    std::size_t nMore = 0;
+    bool bMoved = true;
+    while (nCode != 0 && ZSTD_isError(nCode) == 0 && bMoved && nMore <= nOutput + ENOUGH)
     {
-        nBefore = oInput.pos + oOutput.pos;
-        nCode = ZSTD_decompressStream(context, &oOutput, &oInput);
+        ZSTD_outBuffer oBehind{oUnwanted.data(), oUnwanted.size(), 0};
+        ZSTD_outBuffer& oTarget = oOutput.pos < nOutput ? oOutput : oBehind;
+        const std::size_t nBefore = oInput.pos + oTarget.pos;
+        nCode = ZSTD_decompressStream(context, &oTarget, &oInput);
+        nMore += oBehind.pos;
+        bMoved = nBefore != oInput.pos + oTarget.pos;
     }
-    const bool bDone = oOutput.pos == nOutput && ZSTD_isError(nCode) == 0;
-    return {bDone ? Status::eDone : FromZstd(nCode), oOutput.pos};
+    const bool bEnded = nCode == 0 || bMoved || nMore == 0; // else the input ended somewhere in what is too much
+    if (oOutput.pos == nOutput && ZSTD_isError(nCode) == 0 && bEnded)
+        return {Status::eDone, nOutput, nMore != 0};
+    return {oOutput.pos == nOutput && ZSTD_isError(nCode) == 0 ? Status::eCorrupt : FromZstd(nCode), oOutput.pos};
 }
 
 } // namespace

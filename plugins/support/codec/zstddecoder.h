@@ -17,8 +17,8 @@ public:
     ZstdDecoder(ZstdDecoder&&) noexcept;
     ZstdDecoder& operator=(ZstdDecoder&&) noexcept;
 
-    // Decodes one block into at most nOutput bytes. A stream that would give more fills the output and counts as done.
-    // Bytes behind the first frame are ignored.
+    // Decodes one block into at most nOutput bytes, and on to the end of the frame: a wrong check sum means corrupt. A
+    // whole block whose end mark alone is cut off counts as done. Bytes behind the first frame are ignored.
     Result Decode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput);
 
 private:

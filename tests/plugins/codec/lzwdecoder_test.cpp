@@ -180,9 +180,11 @@ TEST(LzwDecoder, DecodesEveryLiberty)
             oData[0] = 9; // two zeros without a clear code in front would look like the first edition
             Exact oStored(Encode(oData, oLiberties[nLiberty])), oOutput(oData.size());
             ASSERT_EQ(oLiberties[nLiberty].mbOld, LzwDecoder::IsOldStyle(oStored.data(), oStored.size())) << what;
-            ASSERT_TRUE(oDecoder.Decode(oStored.data(), oStored.size(), oOutput.data(), oOutput.size()).IsDone())
-                << what;
+            const Result oResult = oDecoder.Decode(oStored.data(), oStored.size(), oOutput.data(), oOutput.size());
+            ASSERT_TRUE(oResult.IsDone() && !oResult.mbMore) << what;
             ASSERT_TRUE(oData == oOutput.ToBytes()) << what;
+            ASSERT_TRUE(oDecoder.Decode(oStored.data(), oStored.size(), oOutput.data(), oOutput.size() / 2).mbMore)
+                << what;
         }
 }
 

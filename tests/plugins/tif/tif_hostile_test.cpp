@@ -1,6 +1,7 @@
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/pct/pct.h"
 #include "tests/plugins/tif/tifsupport.h"
+#include "tests/support/facts.h"
 #include "tests/support/tiffwriter.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/icrs.h"
@@ -183,6 +184,93 @@ TEST_P(TifDamaged, CutFilesAreRefusedByNameAndChangedOnesDoNoHarm)
         EXPECT_NE(message.find(file), std::string::npos) << nSize << ": " << message;
     }
     ChangeBytes(file, oBytes);
+}
+
+// The pixels of everything in a file: the message of the first exception, or empty.
+std::string ReadPixels(const std::string& fileName)
+{
+    try
+    {
+        const TifPointer oFile = OpenTif(fileName);
+        const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(oFile->GetOverviewManager());
+        const std::unique_ptr<krv::datasources::IOverviewManager> poMaskLevels(oFile->GetBitmapOverviewManager());
+        ReadAll(*oFile);
+        for (const unsigned int nLevel : poLevels->GetLevels())
+            ReadAll(*IOPointer(poLevels->GetOverviewIO(nLevel, AllChannels(oFile->GetChanCount()))),
+                    PixelBytes(*oFile));
+        for (const unsigned int nBitmap : oFile->GetBitmapList())
+            ReadAll(*IOPointer(oFile->GetBitmapIO({nBitmap})), 1);
+        for (const unsigned int nLevel : poMaskLevels ? poMaskLevels->GetLevels() : std::vector<unsigned int>())
+            ReadAll(*IOPointer(poMaskLevels->GetOverviewIO(nLevel, {1})), 1);
+        return {};
+    }
+    catch (const krv::Exception& oException)
+    {
+        return oException.GetMessage();
+    }
+}
+
+// Changes single bytes of strips and tiles: what libtiff refuses when it decodes them whole is refused. Returns how
+// much that was.
+unsigned int ChangePixelBytes(const std::string& fileName, unsigned int nTries)
+{
+    const Bytes oSound = ReadBytes(fileName);
+    std::vector<std::size_t> oPlaces;
+    std::uint16_t nPages = 0;
+    {
+        const TiffFile poTiff(TIFFOpen(fileName.c_str(), "r"));
+        nPages = static_cast<std::uint16_t>(TIFFNumberOfDirectories(poTiff.get()));
+        for (std::uint16_t nPage = 0; nPage < nPages && TIFFSetDirectory(poTiff.get(), nPage) == 1; ++nPage)
+            for (std::uint32_t nAt = 0; nAt < TIFFNumberOfStrips(poTiff.get()); ++nAt)
+                for (std::uint64_t nByte = 0; nByte < TIFFGetStrileByteCount(poTiff.get(), nAt); ++nByte)
+                    oPlaces.push_back(TIFFGetStrileOffset(poTiff.get(), nAt) + nByte);
+    }
+    unsigned int nRefused = 0;
+    std::mt19937 oRandom(3);
+    for (unsigned int nTry = 0; nTry < nTries; ++nTry)
+    {
+        Bytes oBytes = oSound;
+        const std::size_t nPlace = oPlaces[oRandom() % oPlaces.size()];
+        oBytes[nPlace] ^= static_cast<unsigned char>(1u << oRandom() % 8);
+        WriteBytes(fileName, oBytes);
+        std::string complaints;
+        for (unsigned int nPage = 0; nPage < nPages; ++nPage)
+            complaints += Judge(fileName, nPage).moComplaints;
+        nRefused += !complaints.empty();
+        EXPECT_TRUE(complaints.empty() || !ReadPixels(fileName).empty()) << "byte " << nPlace << ": " << complaints;
+    }
+    return nRefused;
+}
+
+TEST(TifHostile, DamageThatLibtiffSeesIsSeen)
+{
+    const TempFolder oFolder;
+    const std::string file = oFolder.File("file.tif");
+    for (Recipe oRecipe : RECIPES)
+        for (const bool bTiled : {false, true})
+        {
+            oRecipe.tiled = bTiled && oRecipe.compression != COMPRESSION_JBIG;
+            if (oRecipe.compression == COMPRESSION_NONE)
+                continue;
+            SCOPED_TRACE(oRecipe.compression);
+            MakeFile(file, oRecipe);
+            ChangePixelBytes(file, 40);
+        }
+    for (const char* pOptions : {"LAYOUT=COG COMPRESS=DEFLATE PREDICTOR=2", "COMPRESS=LZW", "COMPRESS=ZSTD"})
+    {
+        std::filesystem::remove(file);
+        const krv::gobs::DataType oType(krv::gobs::eDT_8U);
+        const TifPointer poFile = CreateTif(file, pOptions, 300, 270, 1, oType);
+        WriteAll(*poFile, MakePixels(300, 270, 1, oType, 1));
+        poFile->Close();
+        EXPECT_GT(ChangePixelBytes(file, 60), 5u) << pOptions;
+    }
+    const std::string real = DataFolder() + "/mask/cog_uint8_rgb_mask.tif";
+    if (std::filesystem::exists(real))
+    {
+        WriteFile(file, ReadFile(real));
+        EXPECT_GT(ChangePixelBytes(file, 60), 5u);
+    }
 }
 
 std::string RecipeName(const ::testing::TestParamInfo<Recipe>& oInfo)

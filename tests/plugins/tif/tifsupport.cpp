@@ -186,6 +186,7 @@ Judgement Judge(const std::string& fileName, unsigned int nDirectory)
     nBlockWidth = oJudgement.mnWidth;
     TIFFGetField(pTiff, TIFFTAG_TILEWIDTH, &nBlockWidth);
     TIFFGetFieldDefaulted(pTiff, oJudgement.mbTiled ? TIFFTAG_TILELENGTH : TIFFTAG_ROWSPERSTRIP, &nBlockHeight);
+    nBlockHeight = oJudgement.mbTiled ? nBlockHeight : std::min(nBlockHeight, oJudgement.mnHeight);
 
     if (oJudgement.mnCompression == COMPRESSION_JPEG)
         TIFFSetField(pTiff, TIFFTAG_JPEGCOLORMODE, JPEGCOLORMODE_RGB); // all samples, whatever the subsampling
