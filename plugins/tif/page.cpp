@@ -131,6 +131,15 @@ void Page::Fail(const std::string& what, const Place& oPlace) const
     throw FileFormatException(GetFileName(), GetFileName() + ": " + what, oPlace);
 }
 
+std::span<const unsigned char> Page::GetJpegTables() const
+{
+    std::uint32_t nBytes = 0;
+    const void* pBytes = nullptr;
+    if (TIFFGetField(GetTiff(), TIFFTAG_JPEGTABLES, &nBytes, &pBytes) != 1 || pBytes == nullptr)
+        return {};
+    return {static_cast<const unsigned char*>(pBytes), nBytes};
+}
+
 PeekReader& Page::CheckDirectory()
 {
     CheckTagSizes();

@@ -9,6 +9,7 @@
 
 #include <cstdint>
 #include <memory>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -76,6 +77,8 @@ public:
     PeekReader& GetReader() { return moReader; }
     TIFF* GetTiff() const { return moHandle.Get(); }
     TiffHandle& GetHandle() { return moHandle; }
+    // Of tag 347, as long as the page is there; none when there is none.
+    std::span<const unsigned char> GetJpegTables() const;
     StrileTable& GetStriles() { return *mpoStriles; }
 
     // Throws FileFormatException "<file>: <what>".

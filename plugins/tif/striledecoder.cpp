@@ -73,14 +73,33 @@ void StrileDecoder::CheckStream(std::uint32_t nStrile, const unsigned char* pRaw
         moPage.Fail(Describe(nStrile) + ": its JBIG stream is of another size");
 }
 
+// Where the directory says nothing of the colours' sampling, the streams do.
+void StrileDecoder::PrepareJpeg(std::uint32_t nStrile, std::span<unsigned char>& oRaw)
+{
+    if (!moJpeg)
+    {
+        moJpeg.emplace(moPage.GetJpegTables());
+        const JpegHeader oHeader = JpegHeader::Read(oRaw);
+        if (moForm.mnPhotometric == PHOTOMETRIC_YCBCR && oHeader.moComponents.size() == 3 &&
+            moPage.GetDirectory().Find(TIFFTAG_YCBCRSUBSAMPLING) == nullptr)
+            TIFFSetField(moPage.GetTiff(), TIFFTAG_YCBCRSUBSAMPLING, int{oHeader.moComponents[0].mnAcross},
+                         int{oHeader.moComponents[0].mnDown});
+    }
+    if (!moJpeg->Complete(oRaw))
+        moPage.Fail(Describe(nStrile) + ": its JPEG stream lacks a table");
+}
+
 void StrileDecoder::DecodeByLibrary(std::uint32_t nStrile, unsigned char* pRaw, std::size_t nRaw,
                                     unsigned char* pTarget, std::size_t nBytes)
 {
     CheckStream(nStrile, pRaw, nRaw);
+    std::span<unsigned char> oRaw{pRaw, nRaw};
+    if (moForm.mnCompression == COMPRESSION_JPEG)
+        PrepareJpeg(nStrile, oRaw);
     TiffHandle& oHandle = moPage.GetHandle();
     oHandle.Forget();
-    const int nDone = TIFFReadFromUserBuffer(oHandle.Get(), nStrile, pRaw, static_cast<tmsize_t>(nRaw), pTarget,
-                                             static_cast<tmsize_t>(nBytes));
+    const int nDone = TIFFReadFromUserBuffer(oHandle.Get(), nStrile, oRaw.data(), static_cast<tmsize_t>(oRaw.size()),
+                                             pTarget, static_cast<tmsize_t>(nBytes));
     const std::string message = oHandle.TakeMessage("its data are damaged");
     if (nDone != 1 || oHandle.HasLostData())
         moPage.Fail(Describe(nStrile) + ": " + message);

@@ -5,10 +5,13 @@
 #include "plugins/support/codec/predictor.h"
 #include "plugins/support/codec/zstddecoder.h"
 #include "plugins/support/scratch.h"
+#include "plugins/tif/jpegheader.h"
 #include "plugins/tif/page.h"
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -54,6 +57,7 @@ private:
     codec::Result DecodeOwn(const unsigned char* pRaw, std::size_t nRaw, unsigned char* pTarget, std::size_t nBytes);
     void DecodeByLibrary(std::uint32_t nStrile, unsigned char* pRaw, std::size_t nRaw, unsigned char* pTarget,
                          std::size_t nBytes);
+    void PrepareJpeg(std::uint32_t nStrile, std::span<unsigned char>& oRaw);
     void CheckStream(std::uint32_t nStrile, const unsigned char* pRaw, std::size_t nRaw) const;
     void UndoPredictor(unsigned char* pStored, std::size_t nStoredPitch, std::uint32_t nStoredWidth,
                        const WantedPixels& oWanted);
@@ -65,6 +69,7 @@ private:
     codec::DeflateDecoder moDeflate;
     codec::LzwDecoder moLzw;
     codec::ZstdDecoder moZstd;
+    std::optional<JpegCompleter> moJpeg;
     support::Scratch moScratch;
     std::vector<unsigned char> moPredictorScratch;
 };

@@ -16,7 +16,8 @@ constexpr std::uint32_t FIRST_FREE_CODE = 258;
 constexpr std::uint32_t LAST_CODE = 4094;
 constexpr unsigned int FIRST_WIDTH = 9;
 
-// Codes go out most significant bit first.
+// Codes go out most significant bit first, in the first edition least significant bit first.
+template <bool bOld>
 class BitWriter
 {
 public:
@@ -24,19 +25,20 @@ public:
 
     void Put(std::uint32_t nCode, unsigned int nWidth)
     {
-        mnBits = mnBits << nWidth | nCode;
+        mnBits = bOld ? mnBits | std::uint64_t{nCode} << mnCount : mnBits << nWidth | nCode;
         mnCount += nWidth;
         while (mnCount >= 8)
         {
             mnCount -= 8;
-            *mpNext++ = static_cast<unsigned char>(mnBits >> mnCount);
+            *mpNext++ = static_cast<unsigned char>(bOld ? mnBits : mnBits >> mnCount);
+            mnBits = bOld ? mnBits >> 8 : mnBits;
         }
     }
 
     std::size_t Finish()
     {
         if (mnCount > 0)
-            *mpNext++ = static_cast<unsigned char>(mnBits << (8 - mnCount));
+            *mpNext++ = static_cast<unsigned char>(bOld ? mnBits : mnBits << (8 - mnCount));
         return static_cast<std::size_t>(mpNext - mpBegin);
     }
 
@@ -86,14 +88,21 @@ std::size_t LzwEncoder::GetBound(std::size_t nInput)
     return nInput + nInput / 2 + nInput / 2048 + 16;
 }
 
-std::size_t LzwEncoder::Encode(const unsigned char* input, std::size_t nInput, unsigned char* output)
+std::size_t LzwEncoder::Encode(const unsigned char* input, std::size_t nInput, unsigned char* output, bool bOld)
 {
-    BitWriter oBits(output);
+    return bOld ? Run<true>(input, nInput, output) : Run<false>(input, nInput, output);
+}
+
+template <bool bOld>
+std::size_t LzwEncoder::Run(const unsigned char* input, std::size_t nInput, unsigned char* output)
+{
+    BitWriter<bOld> oBits(output);
     std::uint32_t nFree = FIRST_FREE_CODE;
     unsigned int nWidth = FIRST_WIDTH;
     mpoTable->Clear();
     oBits.Put(CLEAR_CODE, nWidth);
-    // The width grows one code early; the clear code is written before the table is full.
+    // The width grows one code early, in the first edition just in time; the clear code is written before the table is
+    // full.
     const auto Count = [&]
     {
         ++nFree;
@@ -104,7 +113,7 @@ std::size_t LzwEncoder::Encode(const unsigned char* input, std::size_t nInput, u
             nFree = FIRST_FREE_CODE;
             nWidth = FIRST_WIDTH;
         }
-        else if (nFree > (1u << nWidth) - 1)
+        else if (nFree > (1u << nWidth) - (bOld ? 0 : 1))
             ++nWidth;
     };
     if (nInput > 0)

@@ -18,10 +18,14 @@ public:
     // Room that the code of nInput bytes takes at most.
     static std::size_t GetBound(std::size_t nInput);
 
-    // Encodes one block and returns its bytes; the output holds at least GetBound(nInput).
-    std::size_t Encode(const unsigned char* input, std::size_t nInput, unsigned char* output);
+    // Encodes one block and returns its bytes; the output holds at least GetBound(nInput). bOld: in the first edition
+    // of the coding, which a page has in all of its blocks or in none: readers take what the first one is for all.
+    std::size_t Encode(const unsigned char* input, std::size_t nInput, unsigned char* output, bool bOld = false);
 
 private:
+    template <bool bOld>
+    std::size_t Run(const unsigned char* input, std::size_t nInput, unsigned char* output);
+
     struct Table;
     std::unique_ptr<Table> mpoTable;
 };

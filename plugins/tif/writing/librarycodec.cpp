@@ -95,8 +95,7 @@ void Describe(TIFF* poTiff, const PageForm& oForm, std::uint32_t nRows, std::opt
     TIFFSetField(poTiff, TIFFTAG_BITSPERSAMPLE, static_cast<int>(oForm.moSample.GetBits()));
     TIFFSetField(poTiff, TIFFTAG_PLANARCONFIG, PLANARCONFIG_CONTIG);
     TIFFSetField(poTiff, TIFFTAG_COMPRESSION, static_cast<int>(oForm.mnCompression));
-    const bool bBrightness = oForm.mnPhotometric == PHOTOMETRIC_YCBCR;
-    TIFFSetField(poTiff, TIFFTAG_PHOTOMETRIC, bBrightness ? PHOTOMETRIC_YCBCR : PHOTOMETRIC_MINISBLACK);
+    TIFFSetField(poTiff, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
     if (oForm.mbTiled)
     {
         TIFFSetField(poTiff, TIFFTAG_TILEWIDTH, oForm.mnStrileWidth);
@@ -110,14 +109,6 @@ void Describe(TIFF* poTiff, const PageForm& oForm, std::uint32_t nRows, std::opt
         TIFFSetField(poTiff, TIFFTAG_SAMPLEFORMAT, SAMPLEFORMAT_IEEEFP);
     if (oForm.mnCompression == COMPRESSION_LZMA && oLevel)
         TIFFSetField(poTiff, TIFFTAG_LZMAPRESET, *oLevel);
-    if (oForm.mnCompression != COMPRESSION_JPEG)
-        return;
-    // Every strip or tile carries its own tables: those of the page may be of another quality.
-    TIFFSetField(poTiff, TIFFTAG_JPEGTABLESMODE, 0);
-    if (oLevel)
-        TIFFSetField(poTiff, TIFFTAG_JPEGQUALITY, *oLevel);
-    if (bBrightness)
-        TIFFSetField(poTiff, TIFFTAG_JPEGCOLORMODE, JPEGCOLORMODE_RGB);
 }
 
 } // namespace

@@ -220,19 +220,13 @@ std::shared_ptr<PageModel> MakeImagePage(const NewImage& oImage, const CreateOpt
 
 std::shared_ptr<PageModel> MakeReducedPage(const PageModel& oFull, std::uint32_t nWidth, std::uint32_t nHeight)
 {
-    constexpr std::uint16_t KEPT[] = {TIFFTAG_BITSPERSAMPLE,
-                                      TIFFTAG_COMPRESSION,
-                                      TIFFTAG_PHOTOMETRIC,
-                                      TIFFTAG_SAMPLESPERPIXEL,
-                                      TIFFTAG_PLANARCONFIG,
-                                      TIFFTAG_PREDICTOR,
-                                      TIFFTAG_COLORMAP,
-                                      TIFFTAG_EXTRASAMPLES,
-                                      TIFFTAG_SAMPLEFORMAT,
-                                      TIFFTAG_YCBCRSUBSAMPLING,
-                                      TIFFTAG_REFERENCEBLACKWHITE,
-                                      TIFFTAG_INKSET,
-                                      42113};
+    constexpr std::uint16_t KEPT[] = {TIFFTAG_BITSPERSAMPLE, TIFFTAG_COMPRESSION,
+                                      TIFFTAG_PHOTOMETRIC,   TIFFTAG_SAMPLESPERPIXEL,
+                                      TIFFTAG_PLANARCONFIG,  TIFFTAG_PREDICTOR,
+                                      TIFFTAG_COLORMAP,      TIFFTAG_EXTRASAMPLES,
+                                      TIFFTAG_SAMPLEFORMAT,  TIFFTAG_YCBCRSUBSAMPLING,
+                                      TIFFTAG_JPEGTABLES,    TIFFTAG_REFERENCEBLACKWHITE,
+                                      TIFFTAG_INKSET,        42113};
     auto poPage = std::make_shared<PageModel>(oFull.moTags.IsBigEndian());
     TagList& oTags = poPage->moTags;
     for (const std::uint16_t nTag : KEPT)

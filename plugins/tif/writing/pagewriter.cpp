@@ -150,9 +150,32 @@ void PageWriter::WriteInPlace(const Strile& oStrile, const support::PixelRect& o
 void PageWriter::Store(const Strile& oStrile, const unsigned char* pPixels, std::size_t nPitch)
 {
     const std::span<const unsigned char> oBytes =
-        moEncoder.Encode(pPixels, nPitch, oStrile.moRect.mnWidth, oStrile.moRect.mnHeight, oStrile.mnStoredRows);
+        moEncoder.Encode(pPixels, nPitch, oStrile.moRect.mnWidth, oStrile.moRect.mnHeight, oStrile.mnStoredRows,
+                         ReadForm(oStrile.mnNumber));
     mpoEditor->StoreStrile(*mpoModel, oStrile.mnNumber, oBytes.data(), oBytes.size());
     moReader.Forget();
+}
+
+// The begin of what is replaced; of a strip or tile that is not stored yet that of the first one that is.
+std::span<const unsigned char> PageWriter::ReadForm(std::uint64_t nStrile)
+{
+    const std::vector<std::uint64_t>& oCounts = mpoModel->moByteCounts;
+    if (moEncoder.GetFormBytes() == 0)
+        return {};
+    if (oCounts[nStrile] == 0)
+    {
+        if (mnLike != UINT64_MAX)
+            return moLike;
+        nStrile = static_cast<std::uint64_t>(
+            std::find_if(oCounts.begin(), oCounts.end(), [](std::uint64_t nBytes) { return nBytes != 0; }) -
+            oCounts.begin());
+        if (nStrile == oCounts.size())
+            return {};
+    }
+    mnLike = nStrile;
+    moLike.resize(std::min<std::uint64_t>(oCounts[nStrile], moEncoder.GetFormBytes()));
+    moLike.resize(mpoEditor->GetFile()->ReadUpTo(mpoModel->moOffsets[nStrile], moLike.data(), moLike.size()));
+    return moLike;
 }
 
 void PageWriter::ReadStored(const Strile& oStrile, unsigned char* pTarget, std::size_t nPitch)

@@ -67,6 +67,7 @@ private:
                       std::size_t nPitch);
     void Store(const Strile& oStrile, const unsigned char* pPixels, std::size_t nPitch);
     Held& Hold(const Strile& oStrile);
+    std::span<const unsigned char> ReadForm(std::uint64_t nStrile);
     void ReadStored(const Strile& oStrile, unsigned char* pTarget, std::size_t nPitch);
     void StoreOldest();
     void Forget(std::uint64_t nStrile);
@@ -78,6 +79,8 @@ private:
     const PageForm& moForm;
     StrileSource moReader;
     StrileEncoder moEncoder;
+    std::vector<unsigned char> moLike; // the begin of a strip or tile that others take their form of
+    std::uint64_t mnLike = UINT64_MAX;
     std::size_t mnBound;
     std::size_t mnHeldBytes = 0;
     std::list<Held> moHeld; // the one used last first

@@ -2,6 +2,7 @@
 
 #include "plugins/support/codec/bits.h"
 #include "plugins/support/codec/interleave.h"
+#include "plugins/support/codec/lzwdecoder.h"
 #include "plugins/support/codec/predictor.h"
 #include "plugins/tif/writing/createoptions.h"
 #include "plugins/tif/writing/librarycodec.h"
@@ -35,7 +36,7 @@ bool IsOwnCodec(std::uint16_t nCompression)
 // Codecs of libtiff that need nothing but the tags of the page.
 bool IsLibraryCodec(std::uint16_t nCompression)
 {
-    return nCompression == COMPRESSION_PACKBITS || nCompression == COMPRESSION_LZMA || nCompression == COMPRESSION_JPEG;
+    return nCompression == COMPRESSION_PACKBITS || nCompression == COMPRESSION_LZMA;
 }
 
 std::int64_t ReadSample(const unsigned char* pSample, std::size_t nBytes, bool bSigned)
@@ -59,6 +60,8 @@ StrileEncoder::StrileEncoder(Page& oPage, PixelUse eUse, std::optional<int> oLev
         mpoZstd = std::make_unique<codec::ZstdEncoder>(moLevel.value_or(codec::ZstdEncoder::DEFAULT_LEVEL));
     else if (nCompression == COMPRESSION_LZW)
         mpoLzw = std::make_unique<codec::LzwEncoder>();
+    else if (nCompression == COMPRESSION_JPEG)
+        mpoJpeg = std::make_unique<JpegEncoder>(oPage, oLevel);
 }
 
 StrileEncoder::~StrileEncoder() = default;
@@ -69,10 +72,12 @@ std::string StrileEncoder::FindObstacle() const
     const bool bReal = oSample.meWidening == Widening::eHalf || oSample.meWidening == Widening::eFloat24;
     const bool bPacked = oSample.mnParts == 1 && oSample.mnPartBits <= MOST_PACKED_BITS &&
                          (oSample.meWidening == Widening::eThreeBytes || !oSample.IsWhole());
-    if (moForm.mbReversedBits)
-        return "bytes with their lowest bit first";
     if (oSample.meWidening != Widening::eNone && !bReal && !(bPacked && moForm.mnPredictor == PREDICTOR_NONE))
         return "samples of " + std::to_string(oSample.GetBits()) + " bits";
+    if (mpoJpeg && meUse == PixelUse::eBitmap)
+        return "a compression that would change its bits";
+    if (mpoJpeg)
+        return mpoJpeg->GetObstacle();
     if (moForm.mnCompression != COMPRESSION_NONE && !IsOwnCodec(moForm.mnCompression) &&
         !(IsLibraryCodec(moForm.mnCompression) && TIFFIsCODECConfigured(moForm.mnCompression) != 0))
         return "the compression " + std::to_string(moForm.mnCompression);
@@ -90,7 +95,7 @@ bool StrileEncoder::IsPlain() const
 {
     const bool bOrdered = moForm.mbBigEndian == BIG_ENDIAN_MACHINE || moForm.moSample.GetPartBytes() == 1;
     return moForm.mnCompression == COMPRESSION_NONE && moForm.moSample.meWidening == Widening::eNone && bOrdered &&
-           meUse == PixelUse::eImage;
+           meUse == PixelUse::eImage && !moForm.mbReversedBits;
 }
 
 // Values of fewer bits than they are handed in with. Reals become the nearest of their width.
@@ -204,14 +209,17 @@ StrileEncoder::Rows StrileEncoder::Order(const Rows& oRows, std::uint32_t nStore
 }
 
 std::span<const unsigned char> StrileEncoder::Compress(const unsigned char* pStored, std::size_t nBytes,
-                                                       std::uint32_t nStoredRows)
+                                                       std::uint32_t nStoredRows, std::span<const unsigned char> oLike)
 {
     if (moForm.mnCompression == COMPRESSION_NONE)
         return {pStored, nBytes};
+    if (mpoJpeg)
+        return mpoJpeg->Encode(pStored, nStoredRows, oLike);
     if (mpoLzw)
     {
+        const bool bOld = codec::LzwDecoder::IsOldStyle(oLike.data(), oLike.size());
         unsigned char* pCoded = moCoded.Get(codec::LzwEncoder::GetBound(nBytes));
-        return {pCoded, mpoLzw->Encode(pStored, nBytes, pCoded)};
+        return {pCoded, mpoLzw->Encode(pStored, nBytes, pCoded, bOld)};
     }
     if (mpoDeflate || mpoZstd)
     {
@@ -226,12 +234,20 @@ std::span<const unsigned char> StrileEncoder::Compress(const unsigned char* pSto
 
 std::span<const unsigned char> StrileEncoder::Encode(const unsigned char* pSource, std::size_t nPitch,
                                                      std::uint32_t nWidth, std::uint32_t nRows,
-                                                     std::uint32_t nStoredRows)
+                                                     std::uint32_t nStoredRows, std::span<const unsigned char> oLike)
 {
     const Rows oNarrow = Narrow({pSource, nPitch}, nWidth, nRows);
     const Rows oPadded = Pad(oNarrow, nWidth, nRows, nStoredRows);
     const Rows oOrdered = Order(oPadded, nStoredRows);
-    return Compress(oOrdered.mpFirst, moForm.GetStoredRowBytes(moForm.mnStrileWidth) * nStoredRows, nStoredRows);
+    const std::size_t nBytes = moForm.GetStoredRowBytes(moForm.mnStrileWidth) * nStoredRows;
+    if (!moForm.mbReversedBits || mpoJpeg)
+        return Compress(oOrdered.mpFirst, nBytes, nStoredRows, oLike);
+    unsigned char aLike[2] = {};
+    codec::ReverseBits(oLike.data(), aLike, std::min(oLike.size(), sizeof(aLike)));
+    const std::span<const unsigned char> oCoded = Compress(oOrdered.mpFirst, nBytes, nStoredRows, aLike);
+    unsigned char* pReversed = moReversed.Get(oCoded.size());
+    codec::ReverseBits(oCoded.data(), pReversed, oCoded.size());
+    return {pReversed, oCoded.size()};
 }
 
 } // namespace krv::plugins::tif

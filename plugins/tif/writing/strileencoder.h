@@ -6,6 +6,7 @@
 #include "plugins/support/scratch.h"
 #include "plugins/tif/page.h"
 #include "plugins/tif/strilesource.h"
+#include "plugins/tif/writing/jpegencoder.h"
 #include "toolkit/exceptions/place.h"
 
 #include <cstddef>
@@ -34,10 +35,15 @@ public:
     // Whether stored rows are just the rows that are handed in.
     bool IsPlain() const;
 
-    // nWidth, nRows: what of the strip or tile lies in the image. nStoredRows: the rows that it stores. The result is
-    // valid until the next call; it may be the source itself.
+    // How many bytes of what is stored tell Encode the form of the page's strips or tiles.
+    std::size_t GetFormBytes() const { return mpoJpeg ? JpegEncoder::FORM_BYTES : mpoLzw ? 2 : 0; }
+
+    // nWidth, nRows: what of the strip or tile lies in the image. nStoredRows: the rows that it stores. oLike: so many
+    // of the bytes that are replaced, or of others of the page. The result is valid until the next call; it may be the
+    // source itself.
     std::span<const unsigned char> Encode(const unsigned char* pSource, std::size_t nPitch, std::uint32_t nWidth,
-                                          std::uint32_t nRows, std::uint32_t nStoredRows);
+                                          std::uint32_t nRows, std::uint32_t nStoredRows,
+                                          std::span<const unsigned char> oLike);
 
 private:
     struct Rows
@@ -51,8 +57,8 @@ private:
     void Pack(const unsigned char* pRow, unsigned char* pNext, std::size_t nSamples) const;
     Rows Pad(const Rows& oRows, std::uint32_t nWidth, std::uint32_t nRows, std::uint32_t nStoredRows);
     Rows Order(const Rows& oRows, std::uint32_t nStoredRows);
-    std::span<const unsigned char> Compress(const unsigned char* pStored, std::size_t nBytes,
-                                            std::uint32_t nStoredRows);
+    std::span<const unsigned char> Compress(const unsigned char* pStored, std::size_t nBytes, std::uint32_t nStoredRows,
+                                            std::span<const unsigned char> oLike);
 
     Page& moPage;
     const PageForm& moForm;
@@ -61,10 +67,12 @@ private:
     std::unique_ptr<codec::DeflateEncoder> mpoDeflate;
     std::unique_ptr<codec::ZstdEncoder> mpoZstd;
     std::unique_ptr<codec::LzwEncoder> mpoLzw;
+    std::unique_ptr<JpegEncoder> mpoJpeg;
     support::Scratch moNarrow;
     support::Scratch moPadded;
     support::Scratch moOrdered;
     support::Scratch moCoded;
+    support::Scratch moReversed;
     std::vector<unsigned char> moPredictorScratch;
     std::vector<unsigned char> moLibraryBytes;
 };

@@ -1,5 +1,6 @@
 #include "plugins/support/codec/lzwdecoder.h"
 
+#include "plugins/support/codec/lzwencoder.h"
 #include "tests/plugins/codec/blocks.h"
 
 #include <gtest/gtest.h>
@@ -235,6 +236,24 @@ TEST(LzwDecoder, TakesAnyOrderOfCodes)
         }
         ExpectAsTextbook(oDecoder, oWriter.GetBytes(), 200000 + oRandom() % 64, "seed " + std::to_string(nSeed));
     }
+}
+
+TEST(LzwEncoder, ComesBackInBothEditions)
+{
+    krv::plugins::codec::LzwEncoder oEncoder;
+    for (const bool bOld : {false, true})
+        for (std::size_t nBytes : {0U, 1U, 700U, 3000U, 40000U})
+            for (const unsigned int nValues : {2U, 256U})
+            {
+                Bytes oBlock(nBytes), oCoded(krv::plugins::codec::LzwEncoder::GetBound(nBytes)), oBack(nBytes);
+                std::mt19937 oRandom(static_cast<unsigned int>(nBytes));
+                for (unsigned char& nByte : oBlock)
+                    nByte = static_cast<unsigned char>(oRandom() % nValues);
+                const std::size_t nCoded = oEncoder.Encode(oBlock.data(), nBytes, oCoded.data(), bOld);
+                EXPECT_EQ(LzwDecoder::IsOldStyle(oCoded.data(), nCoded), bOld);
+                EXPECT_TRUE(LzwDecoder().Decode(oCoded.data(), nCoded, oBack.data(), nBytes).IsDone());
+                EXPECT_TRUE(oBack == oBlock) << nBytes << " bytes of " << nValues << " values";
+            }
 }
 
 TEST(LzwDecoder, NeedsNothingForEmptyOutput)
