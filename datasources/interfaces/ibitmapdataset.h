@@ -15,6 +15,12 @@ class IRasterIO;
 // The bitmaps (masks) of a dataset, of the image's size, each with a number from 1 that it keeps. Bits are handed out
 // and taken as they are stored, one byte per pixel: reading gives 0 or 1, writing takes any byte but 0 as set. The
 // order of the virtual operations is public and fixed.
+//
+// A bitmap with a description is a zone: somebody's selection of pixels, which changes nothing else. One without says
+// which pixels are valid. The validity mask of the image is the one of these with the lowest number; its set bits are
+// the valid pixels, and ValiditySource, levels, statistics and pictures honour it. A bitmap is made the validity mask
+// by SetBitmapDescription with an empty text, and made a zone again by any other text; CreateBitmap makes zones. A
+// format stores the two kinds so that other readers do not take a zone for validity.
 class KRV_DATASOURCES_API IBitmapDataset
 {
 public:
@@ -25,14 +31,19 @@ public:
     // A new 8-bit unsigned I/O object over the listed bitmaps, owned by the caller.
     virtual IRasterIO* GetBitmapIO(const std::vector<unsigned int>& oBitmaps) = 0;
     virtual void DeleteBitmap(unsigned int nBitmap) = 0;
-    // Adds a bitmap, all clear, and returns its number.
+    // Adds a zone, all clear and with a description of the format's choice, and returns its number.
     virtual unsigned int CreateBitmap() = 0;
     virtual std::string GetBitmapDescription(unsigned int nBitmap) const = 0;
+    // Decides the kind of the bitmap as well; the pixels stay.
     virtual void SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription) = 0;
     virtual MetadataMap GetBitmapMetadata(unsigned int nBitmap) const = 0;
     virtual void SetBitmapMetadata(unsigned int nBitmap, const MetadataMap& oMetadata) = 0;
-    // The levels of the bitmaps, with bitmap numbers for channels; a new object that the caller deletes, or null.
+    // The levels of the bitmaps, with bitmap numbers for channels; a new object that the caller deletes, or null. A
+    // format may have levels of the validity mask alone.
     virtual IOverviewManager* GetBitmapOverviewManager() = 0;
 };
+
+// The number of the validity mask; 0 when there is none.
+KRV_DATASOURCES_API unsigned int FindValidityMask(const IBitmapDataset& oBitmaps);
 
 } // namespace krv::datasources

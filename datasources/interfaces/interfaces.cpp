@@ -1,4 +1,5 @@
-// The destructors of the pure interfaces: one home each, so that every library shares one type-info per class.
+// The destructors of the pure interfaces: one home each, so that every library shares one type-info per class. And
+// the rule that goes with an interface.
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/ichannelfilter.h"
 #include "datasources/interfaces/ichannelinfo.h"
@@ -33,5 +34,13 @@ IOverviewManager::~IOverviewManager() = default;
 IPCTDataset::~IPCTDataset() = default;
 IRasterDataset::~IRasterDataset() = default;
 IRasterIO::~IRasterIO() = default;
+
+unsigned int FindValidityMask(const IBitmapDataset& oBitmaps)
+{
+    for (const unsigned int nBitmap : oBitmaps.GetBitmapList())
+        if (oBitmaps.GetBitmapDescription(nBitmap).empty())
+            return nBitmap;
+    return 0;
+}
 
 } // namespace krv::datasources

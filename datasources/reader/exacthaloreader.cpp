@@ -6,6 +6,7 @@
 #include "datasources/reader/detail/rasterchannels.h"
 #include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/reader/rasteriterator.h"
+#include "gobs/mask/samplematch.h"
 #include "gobs/raster/buffertype.h"
 #include "gobs/raster/raster.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -89,22 +90,6 @@ void CopyRow(const unsigned char* pSource, const Span& oColumns, unsigned char* 
         std::memcpy(pTarget + nAt * nPixelBytes, pSource + nFrom * nPixelBytes, nRun * nPixelBytes);
         nAt += nRun;
     }
-}
-
-// One value in the bytes of a type.
-void StoreValue(const krv::gobs::SampleValue& oValue, const krv::gobs::DataType& oType, unsigned char* pTarget)
-{
-    using krv::gobs::SampleValue;
-    const auto eTarget = krv::gobs::QRFDataType2RasterBufferType(oType);
-    const std::uint64_t nUnsigned = oValue.GetKind() == SampleValue::eUnsigned ? oValue.GetUnsigned() : 0;
-    const std::int64_t nNegative = oValue.GetKind() == SampleValue::eNegative ? oValue.GetNegative() : 0;
-    const double nReal = oValue.GetReal();
-    if (oValue.GetKind() == SampleValue::eUnsigned)
-        krv::raster::CopyData(&nUnsigned, krv::raster::eBT_64U, 1, pTarget, eTarget, 1, 1);
-    else if (oValue.GetKind() == SampleValue::eNegative)
-        krv::raster::CopyData(&nNegative, krv::raster::eBT_64S, 1, pTarget, eTarget, 1, 1);
-    else
-        krv::raster::CopyData(&nReal, krv::raster::eBT_64R, 1, pTarget, eTarget, 1, 1);
 }
 
 } // namespace
@@ -220,23 +205,32 @@ void ExactHaloReader::ReadAcrossBorder(krv::gobs::Raster& oRaster)
     }
 }
 
-// The bytes of one pixel outside the image under eConstant and eNoData.
+// The bytes of one pixel outside the image under eConstant and eNoData. A no-data value that no sample can equal is
+// none.
 std::vector<unsigned char> ExactHaloReader::MakeOutsidePixel() const
 {
-    using krv::gobs::SampleValue;
     const krv::gobs::DataType& oType = GetDataType();
     const unsigned int nChannels = GetChansCount();
     std::vector<unsigned char> oPixel(mnPixelBytes);
     const AuxiliaryData oMetadata = meMarginBehaviour == eNoData ? GetAuxiliaryData() : AuxiliaryData();
     for (unsigned int nChannel = 0; nChannel < nChannels; ++nChannel)
     {
-        std::optional<SampleValue> oValue = SampleValue::FromReal(moConstant.empty() ? 0 : moConstant[nChannel]);
-        if (meMarginBehaviour == eNoData)
-            oValue = GetTypedNoData(oMetadata, nChannel + 1);
+        unsigned char* const pValue = oPixel.data() + mnPixelBytes / nChannels * nChannel;
+        if (meMarginBehaviour == eConstant)
+        {
+            const double nConstant = moConstant.empty() ? 0 : moConstant[nChannel];
+            krv::raster::CopyData(&nConstant, krv::raster::eBT_64R, 1, pValue,
+                                  krv::gobs::QRFDataType2RasterBufferType(oType), 1, 1);
+            continue;
+        }
+        const std::optional<NoDataValue> oValue = GetTypedNoData(oMetadata, nChannel + 1);
         if (!oValue)
             throw krv::DataException("Channel " + std::to_string(nChannel + 1) +
                                      " has no no-data value for the pixels outside the image");
-        StoreValue(*oValue, oType, oPixel.data() + mnPixelBytes / nChannels * nChannel);
+        if (!krv::gobs::StoreSample(*oValue, oType, pValue))
+            throw krv::DataException("Channel " + std::to_string(nChannel + 1) + ": no value of type " +
+                                     oType.Describe() + " equals the no-data value " + oValue->GetText() +
+                                     " for the pixels outside the image");
     }
     return oPixel;
 }

@@ -29,8 +29,8 @@ public:
     void SetConstant(const std::vector<double>& oValues);
 
     // Any width with any behaviour. eException: a raster that reaches outside the image throws DataException. eNoData:
-    // a channel without a no-data value does. Throws ParameterException for an unknown behaviour and keeps the former
-    // one.
+    // a channel without a no-data value that its type holds does. Throws ParameterException for an unknown behaviour
+    // and keeps the former one.
     void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour) override;
 
     krv::gobs::Raster* GetRaster(unsigned int nIndex) override;

@@ -1,3 +1,4 @@
+#include "datasources/reader/idatasetaccess.h"
 #include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/reader/irasteriterable.h"
 #include "datasources/reader/irasterreader.h"
@@ -5,6 +6,7 @@
 namespace krv::datasources
 {
 
+IDatasetAccess::~IDatasetAccess() = default;
 IOverviewAccessor::~IOverviewAccessor() = default;
 IOverviewReaderAccessor::~IOverviewReaderAccessor() = default;
 IRasterIterable::~IRasterIterable() = default;

@@ -1,13 +1,12 @@
 #pragma once
 
+#include "datasources/reader/idatasetaccess.h"
 #include "datasources/reader/irasterreader.h"
 
 #include <memory>
 
 namespace krv::datasources
 {
-
-class IDataset;
 
 namespace detail
 {
@@ -16,7 +15,7 @@ class RasterChannels;
 
 // The answers that the standard readers and writers give alike: tile grid, margins, size, type and what the dataset
 // says of itself.
-class KRV_DATASOURCES_API RasterAccess : public virtual IRasterReader
+class KRV_DATASOURCES_API RasterAccess : public IDatasetAccess, public virtual IRasterReader
 {
 public:
     RasterAccess(const RasterAccess&) = delete;
@@ -45,10 +44,8 @@ public:
     unsigned int GetChansCount() const override;
     const krv::gobs::DataType& GetDataType() const override;
 
-    // What is read or written: the dataset, null before there is one, which stays where it is, and the numbers of its
-    // channels, or of its bitmaps.
-    IDataset* GetDataset() const;
-    const std::vector<unsigned int>& GetChannels() const;
+    IDataset* GetDataset() const override;
+    const std::vector<unsigned int>& GetChannels() const override;
 
 protected:
     // No dataset, no channels, no margins, eMirror.

@@ -44,19 +44,6 @@ std::vector<unsigned int> FirstChannels(unsigned int nCount)
     return oChannels;
 }
 
-// The first channel that is described as alpha, or 0.
-unsigned int FindAlpha(const AuxiliaryData& oMetadata)
-{
-    const detail::CaseInsensitiveCompare oLess;
-    for (unsigned int nChannel = 1; nChannel <= oMetadata.GetChannelCount(); ++nChannel)
-    {
-        const std::string meaning = oMetadata.GetChanMetadataValue("ColorInterp", nChannel);
-        if (!oLess(meaning, "alpha") && !oLess("alpha", meaning))
-            return nChannel;
-    }
-    return 0;
-}
-
 std::unique_ptr<const IMaskBuilder> ZeroOrNaN(unsigned int nChannel)
 {
     const ExactMaskDecision oDecision(krv::gobs::eAnyChannel, {NoDataValue::FromUnsigned(0)}, {nChannel}, true);
@@ -124,7 +111,20 @@ void Invert(Mask& oMask)
 
 } // namespace
 
-ValiditySource::ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels, BkgdRule eRule)
+unsigned int FindAlpha(const AuxiliaryData& oMetadata)
+{
+    const detail::CaseInsensitiveCompare oLess;
+    for (unsigned int nChannel = 1; nChannel <= oMetadata.GetChannelCount(); ++nChannel)
+    {
+        const std::string meaning = oMetadata.GetChanMetadataValue("ColorInterp", nChannel);
+        if (!oLess(meaning, "alpha") && !oLess("alpha", meaning))
+            return nChannel;
+    }
+    return 0;
+}
+
+ValiditySource::ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels, BkgdRule eRule,
+                               bool bNoData)
 {
     IRasterDataset& oRasterDataset = RequireRaster(poDataset, Place::Current());
     mnImageWidth = oRasterDataset.GetWidth();
@@ -133,7 +133,7 @@ ValiditySource::ValiditySource(IDataset* poDataset, const std::vector<unsigned i
     const std::vector<unsigned int> oListed =
         oChannels.empty() ? FirstChannels(oMetadata.GetChannelCount()) : oChannels;
     const unsigned int nAlpha = FindAlpha(oMetadata);
-    FindNoData(oMetadata, oListed, nAlpha, eRule);
+    FindNoData(oMetadata, bNoData ? oListed : std::vector<unsigned int>(), nAlpha, eRule);
     FindBitmap(*poDataset);
     const auto oAlpha = std::find(oListed.begin(), oListed.end(), nAlpha);
     if (nAlpha != 0 && oAlpha != oListed.end())
@@ -178,15 +178,12 @@ void ValiditySource::FindBitmap(IDataset& oDataset)
     auto* const poBitmaps = dynamic_cast<IBitmapDataset*>(&oDataset);
     if (poBitmaps == nullptr)
         return;
-    for (const unsigned int nBitmap : poBitmaps->GetBitmapList())
-    {
-        if (!poBitmaps->GetBitmapDescription(nBitmap).empty())
-            continue;
-        mpoBitmapReader = std::make_unique<BasicReader>(poBitmaps, std::vector<unsigned int>{nBitmap}, false);
-        if (mpoBitmapReader->GetWidth() != mnImageWidth || mpoBitmapReader->GetHeight() != mnImageHeight)
-            throw krv::DataException("Bitmap " + std::to_string(nBitmap) + " is not of the image's size");
+    mnBitmap = FindValidityMask(*poBitmaps);
+    if (mnBitmap == 0)
         return;
-    }
+    mpoBitmapReader = std::make_unique<BasicReader>(poBitmaps, std::vector<unsigned int>{mnBitmap}, false);
+    if (mpoBitmapReader->GetWidth() != mnImageWidth || mpoBitmapReader->GetHeight() != mnImageHeight)
+        throw krv::DataException("Bitmap " + std::to_string(mnBitmap) + " is not of the image's size");
 }
 
 void ValiditySource::UseAlphaOfRaster(unsigned int nPosition)

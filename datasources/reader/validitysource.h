@@ -16,13 +16,17 @@ class BasicReader;
 class IDataset;
 class IRasterReader;
 
+// The channel that says how opaque pixels are: the first one whose tag "ColorInterp" is "Alpha", in any letter case; 0
+// when there is none.
+KRV_DATASOURCES_API unsigned int FindAlpha(const AuxiliaryData& oMetadata);
+
 // Which pixels of an image hold data, by everything that the image declares at once: no-data values, a mask bitmap and
 // an alpha channel. A pixel is valid when none of them says otherwise and it lies inside the image; unlike the masks of
 // no-data builders a set bit is a valid pixel.
 //
 // No-data: the values of the channels, alpha aside, as GetTypedNoData reads them, combined by the rule. Mask bitmap:
-// the first bitmap without a description; its set bits are valid. Alpha: the first channel whose tag "ColorInterp" is
-// "Alpha", in any letter case; values above 0 are valid. One thread at a time.
+// the validity mask of IBitmapDataset; its set bits are valid. Alpha: the channel that FindAlpha names; values above 0
+// are valid. One thread at a time.
 class KRV_DATASOURCES_API ValiditySource : public krv::gobs::IMaskBuilder
 {
 public:
@@ -30,8 +34,9 @@ public:
     // is borrowed and outlives this. Bitmap and alpha are read from it, with each mask. Throws DataException for a null
     // dataset, one without rasters and a text that is no no-data value, OutOfBoundsException for a channel that does
     // not exist.
+    // bNoData: without it mask bitmap and alpha alone.
     explicit ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels = {},
-                            krv::gobs::BkgdRule eRule = krv::gobs::eAllChannels);
+                            krv::gobs::BkgdRule eRule = krv::gobs::eAllChannels, bool bNoData = true);
     // For rasters of the reader, a level's too: by what its metadata and its channels say. There is no bitmap, and
     // alpha counts only when it is one of the reader's channels. The reader may go away.
     explicit ValiditySource(const IRasterReader& oReader, krv::gobs::BkgdRule eRule = krv::gobs::eAllChannels);
@@ -43,6 +48,8 @@ public:
     bool HasNoData() const { return mbNoData; }
     bool HasBitmap() const { return mpoBitmapReader != nullptr; }
     bool HasAlpha() const { return mpoAlphaReader != nullptr || mnAlphaInRaster != 0; }
+    // The number of the mask bitmap; 0 when there is none.
+    unsigned int GetBitmap() const { return mnBitmap; }
 
     // How the margins of the rasters were made; eMirror when nobody says. Behaviours that copy pixels copy their
     // validity; under the others pixels outside the image are not valid.
@@ -64,6 +71,7 @@ private:
     std::unique_ptr<BasicReader> mpoAlphaReader;
     unsigned int mnImageWidth;
     unsigned int mnImageHeight;
+    unsigned int mnBitmap = 0;
     unsigned int mnAlphaInRaster = 0; // from 1
     bool mbNoData = false;
     eMarginBehaviour meBehaviour = eMirror;

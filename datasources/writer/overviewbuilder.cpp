@@ -6,7 +6,7 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/metadata/auxiliarydata.h"
-#include "datasources/reader/rasteraccess.h"
+#include "datasources/reader/idatasetaccess.h"
 #include "datasources/writer/detail/levelreducer.h"
 #include "datasources/writer/detail/leveltarget.h"
 #include "datasources/writer/detail/samplevalidity.h"
@@ -64,7 +64,7 @@ public:
     void Finish();
 
 private:
-    void FindMask();
+    void FindMask(unsigned int nMask);
     bool PrepareMask(unsigned int nFactor);
     PixelBounds GetChanged(unsigned int nFactor) const;
     void Remove(unsigned int nFactor) const;
@@ -102,24 +102,19 @@ OverviewBuilder::OverviewBuilder(IRasterWriter& oWriter, Resampling eMethod, con
       mpoFinisher(detail::MakeValueFinisher(oWriter.GetAuxiliaryData(), moForm, oOptions.mbNaNIsNoData)),
       mpoAccessor(oWriter.GetOverviewWriterAccessor())
 {
-    if (const auto* const poAccess = dynamic_cast<const RasterAccess*>(&oWriter))
+    if (const auto* const poAccess = dynamic_cast<const IDatasetAccess*>(&oWriter))
         mpoDataset = poAccess->GetDataset();
     const auto* const poRaster = dynamic_cast<const IRasterDataset*>(mpoDataset);
     if (poRaster != nullptr && (poRaster->GetWidth() != moForm.mnWidth || poRaster->GetHeight() != moForm.mnHeight))
         throw krv::DataException("Overviews: the dataset and its raster I/O are of different sizes", oPlace);
-    if (moValidity.HasBitmap())
-        FindMask();
+    if (moValidity.GetBitmap() != 0)
+        FindMask(moValidity.GetBitmap());
 }
 
-// The validity mask is the first bitmap without a description; formats have levels of their first bitmap at least.
-void OverviewBuilder::FindMask()
+void OverviewBuilder::FindMask(unsigned int nMask)
 {
-    auto& oBitmaps = dynamic_cast<IBitmapDataset&>(*mpoDataset);
-    const std::vector<unsigned int> oList = oBitmaps.GetBitmapList();
-    if (oList.empty() || !oBitmaps.GetBitmapDescription(oList.front()).empty())
-        return;
-    mpoMaskManager.reset(oBitmaps.GetBitmapOverviewManager());
-    mnMask = mpoMaskManager != nullptr ? oList.front() : 0;
+    mpoMaskManager.reset(dynamic_cast<IBitmapDataset&>(*mpoDataset).GetBitmapOverviewManager());
+    mnMask = mpoMaskManager != nullptr ? nMask : 0;
 }
 
 // Whether the level of the mask was there and can be kept.
@@ -153,7 +148,9 @@ void OverviewBuilder::Remove(unsigned int nFactor) const
 void OverviewBuilder::Prepare(const std::vector<unsigned int>& oFactors)
 {
     const std::vector<unsigned int> oExisting = mpoAccessor->GetLevels();
-    mpoAccessor->SetResamplingName(GetResamplingName(meMethod));
+    // Averages made from power are what RMS gives of complex values, and are recorded as such.
+    const bool bPower = meMethod == Resampling::eAverage && moForm.moType.IsComplex() && moOptions.mbPower;
+    mpoAccessor->SetResamplingName(GetResamplingName(bPower ? Resampling::eRms : meMethod));
     for (const unsigned int nFactor : oFactors)
     {
         Level& oLevel = moLevels.emplace_back();

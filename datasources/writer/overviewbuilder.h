@@ -55,7 +55,8 @@ struct OverviewOptions
 
     // A pixel of a box method is valid only when at least half of its box is, instead of a single pixel.
     bool mbHalfValid = false;
-    // Complex averages: the magnitude is the root of the mean power, the phase that of the mean.
+    // Complex averages: the magnitude is the root of the mean power, the phase that of the mean. Their levels are
+    // recorded as RMS, which is the same.
     bool mbPower = false;
     // NaN samples of real channels are not valid; without it they count like any value.
     bool mbNaNIsNoData = false;
@@ -72,11 +73,12 @@ struct OverviewOptions
 // made from the full resolution. Levels that do not exist are created, those of another size than above made anew.
 // Memory: about the width of the image times the height of a tile for each level.
 //
-// Valid is a sample when ValiditySource says so of its pixel (no-data, mask bitmap and alpha of the dataset) and it is
-// not itself the no-data value of its channel. Pixels of a level without valid samples get the channel's no-data value,
-// else 0; a result that equals the no-data value by accident becomes the next value above it (below, for the largest
-// of an integer type). Where the format holds levels of the dataset's mask, those say which pixels of the level are
-// valid.
+// Valid is a sample when ValiditySource says so of its pixel (no-data, mask bitmap and alpha of the dataset, which the
+// writer shows by IDatasetAccess; of one that does not, no-data and alpha of its own channels, and a warning is given)
+// and it is not itself the no-data value of its channel. Pixels of a level without valid samples get the channel's
+// no-data value, else 0; a result that equals the no-data value by accident becomes the next value above it (below, for
+// the largest of the type). Where the format holds levels of the dataset's mask, those say which pixels of the level
+// are valid.
 //
 // Levels are marked with the method and as not valid while they are written, as valid at the end. Nothing is
 // synchronised: that is the caller's, after success. False when the progress callback stopped the work; then, and after

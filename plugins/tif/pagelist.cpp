@@ -8,6 +8,7 @@
 #include <set>
 #include <string_view>
 #include <unordered_set>
+#include <utility>
 
 #include <tiff.h>
 
@@ -71,9 +72,19 @@ private:
         const std::uint64_t nOldKind = oDirectory.GetNumber(moReader, TIFFTAG_OSUBFILETYPE, 0);
         oPage.mbReduced = (nKind & FILETYPE_REDUCEDIMAGE) != 0 || nOldKind == OFILETYPE_REDUCEDIMAGE;
         oPage.mbMask = (nKind & FILETYPE_MASK) != 0;
-        oPage.mbDescribed = oDirectory.Find(TIFFTAG_IMAGEDESCRIPTION) != nullptr;
+        oPage.mbPage = (nKind & FILETYPE_PAGE) != 0;
+        oPage.mbDescribed = HasDescription(oDirectory);
         oPage.mnNumber = ParsePageName(ReadName(oDirectory), oPage.mbReduced);
         return oPage;
+    }
+
+    bool HasDescription(const RawDirectory& oDirectory)
+    {
+        const DirectoryEntry* pEntry = oDirectory.Find(TIFFTAG_IMAGEDESCRIPTION);
+        char cFirst = 0;
+        if (pEntry != nullptr && pEntry->mnType == TIFF_ASCII && pEntry->mnCount != 0)
+            moReader.Read(pEntry->mnOffset, &cFirst, 1);
+        return cFirst != 0;
     }
 
     std::string ReadName(const RawDirectory& oDirectory)
@@ -123,9 +134,18 @@ std::vector<PageLevel> CollectLevels(const std::vector<PageSummary>& oPages, Acc
         oList.push_back({nLevel, oPage});
     return oList;
 }
+
 bool IsMaskForm(const PageSummary& oPage)
 {
     return oPage.mbMask && oPage.mnChannels == 1 && (oPage.mnBits == 1 || oPage.mnBits == 8);
+}
+
+bool IsBitmap(const PageSummary& oPage, const PageSummary& oFull)
+{
+    const bool bZone = oPage.mbPage && !oPage.mbMask && oPage.mnNumber != 0 && oPage.mnChannels == 1 &&
+                       (oPage.mnBits == 1 || oPage.mnBits == 8);
+    return (bZone || IsMaskForm(oPage)) && !oPage.mbReduced && oPage.mnWidth == oFull.mnWidth &&
+           oPage.mnHeight == oFull.mnHeight;
 }
 
 void NumberMasks(std::vector<PageSummary>& oMasks)
@@ -186,17 +206,30 @@ std::vector<PageSummary> FindMasks(const std::vector<PageSummary>& oPages)
     std::vector<PageSummary> oMasks;
     for (std::size_t nAt = 1; nAt < oPages.size(); ++nAt)
     {
-        const PageSummary& oPage = oPages[nAt];
-        if (IsMaskForm(oPage) && !oPage.mbReduced && oPage.mnWidth == oPages.front().mnWidth &&
-            oPage.mnHeight == oPages.front().mnHeight)
-            oMasks.push_back(oPage);
+        if (IsBitmap(oPages[nAt], oPages.front()))
+            oMasks.push_back(oPages[nAt]);
     }
     NumberMasks(oMasks);
+    const auto IsBetter = [](const PageSummary& oOne, const PageSummary& oOther)
+    {
+        const auto Rank = [](const PageSummary& oMask)
+        {
+            const unsigned int nKind = !oMask.mbMask ? 2 : oMask.mbDescribed ? 1 : 0;
+            return std::pair(nKind, nKind == 0 ? oMask.mnNumber : 0);
+        };
+        return Rank(oOne) < Rank(oOther);
+    };
+    const auto oBest = std::min_element(oMasks.begin(), oMasks.end(), IsBetter);
+    if (oBest != oMasks.end())
+        std::rotate(oMasks.begin(), oBest, oBest + 1);
     return oMasks;
 }
 
 std::vector<PageLevel> FindMaskLevels(const std::vector<PageSummary>& oPages)
 {
+    const std::vector<PageSummary> oMasks = FindMasks(oPages);
+    if (oMasks.empty() || !oMasks.front().mbMask)
+        return {};
     return CollectLevels(oPages, IsMaskForm);
 }
 

@@ -20,7 +20,8 @@ struct PageSummary
     std::uint64_t mnFormat = 1;
     bool mbReduced = false;
     bool mbMask = false;
-    bool mbDescribed = false; // has an image description
+    bool mbPage = false;      // one of a multi-page file
+    bool mbDescribed = false; // has an image description that is not empty
     // Of a level its reduction factor, of a bitmap its number, where its name says so; else 0.
     unsigned int mnNumber = 0;
 };
@@ -49,9 +50,12 @@ struct PageLevel
 // number the larger counts.
 std::vector<PageLevel> FindLevels(const std::vector<PageSummary>& oPages);
 
-// Full-size masks of one channel of 1 or 8 bits, in the order of the file, and the reduced masks that go with them.
-// Each mask gets the number that its name gives; those without get the smallest that are left.
+// The bitmaps: full-size pages of one channel of 1 or 8 bits that are masks, or that are zones: pages whose name says
+// that they are bitmaps made here. Each gets the number that its name gives; those without get the smallest that are
+// left. The one that reduced masks belong to comes first: the validity mask, which is the mask without a description
+// of the lowest number, or else a mask with one, as zones were stored once; the others stand in the order of the file.
 std::vector<PageSummary> FindMasks(const std::vector<PageSummary>& oPages);
+// The reduced masks; none when there is no mask that they could belong to.
 std::vector<PageLevel> FindMaskLevels(const std::vector<PageSummary>& oPages);
 
 } // namespace krv::plugins::tif

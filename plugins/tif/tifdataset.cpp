@@ -240,7 +240,8 @@ const std::vector<PageLevel>& TifDataset::GetLevels(PixelUse eUse) const
 
 unsigned int TifDataset::GetLevelBitmap() const
 {
-    return GetPages().moMasks.empty() ? 0 : GetPages().moMasks.front().mnNumber;
+    const std::vector<PageSummary>& oMasks = GetPages().moMasks;
+    return oMasks.empty() || !oMasks.front().mbMask ? 0 : oMasks.front().mnNumber;
 }
 
 std::shared_ptr<support::BlockImage> TifDataset::OpenPage(std::uint64_t nDirectory, PixelUse eUse)
@@ -439,13 +440,18 @@ void TifDataset::DeleteBitmap(unsigned int nBitmap)
     }
     oEditor.RemovePage(nGone);
     moImages.erase({nGone, PixelUse::eBitmap});
-    for (const PageLevel& oLevel : oTable.moMaskLevels)
-        if (oTable.moMasks.front().mnOffset == nGone)
-        {
-            oEditor.RemovePage(oLevel.moPage.mnOffset);
-            moImages.erase({oLevel.moPage.mnOffset, PixelUse::eBitmap});
-        }
+    if (oTable.moMasks.front().mnOffset == nGone)
+        RemoveMaskLevels(oTable.moMaskLevels);
     Refresh();
+}
+
+void TifDataset::RemoveMaskLevels(const std::vector<PageLevel>& oLevels)
+{
+    for (const PageLevel& oLevel : oLevels)
+    {
+        mpoEditor->RemovePage(oLevel.moPage.mnOffset);
+        moImages.erase({oLevel.moPage.mnOffset, PixelUse::eBitmap});
+    }
 }
 
 unsigned int TifDataset::CreateBitmap()
@@ -454,10 +460,7 @@ unsigned int TifDataset::CreateBitmap()
     FileEditor& oEditor = GetEditor("bitmaps cannot be added", oPlace);
     const std::vector<unsigned int> oList = GetBitmapList();
     const unsigned int nBitmap = oList.empty() ? 1 : oList.back() + 1;
-    const std::shared_ptr<PageModel> poPage = MakeMaskPage(*oEditor.GetPages().front());
-    poPage->moTags.SetText(TIFFTAG_PAGENAME, MakePageName(nBitmap, false));
-    poPage->moTags.SetText(TIFFTAG_IMAGEDESCRIPTION, MakePageName(nBitmap, false));
-    oEditor.AddPage(poPage);
+    oEditor.AddPage(MakeBitmapPage(*oEditor.GetPages().front(), nBitmap));
     Refresh();
     return nBitmap;
 }
@@ -465,15 +468,22 @@ unsigned int TifDataset::CreateBitmap()
 std::string TifDataset::GetBitmapDescription(unsigned int nBitmap) const
 {
     const PageSummary& oMask = GetMask(nBitmap, Place::Current());
-    return oMask.mbDescribed ? ReadPageMetadata(oMask.mnOffset).GetFileMetadataValue("ImageDescription")
-                             : std::string();
+    if (oMask.mbDescribed)
+        return ReadPageMetadata(oMask.mnOffset).GetFileMetadataValue("ImageDescription");
+    return oMask.mbMask ? std::string() : MakePageName(nBitmap, false);
 }
 
 void TifDataset::SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription)
 {
     const Place oPlace = Place::Current();
     FileEditor& oEditor = GetEditor("bitmaps cannot be written", oPlace);
-    oEditor.GetPage(GetMask(nBitmap, oPlace).mnOffset)->moTags.SetText(TIFFTAG_IMAGEDESCRIPTION, oDescription);
+    const std::uint64_t nMask = GetLevelBitmap();
+    const std::vector<PageLevel> oLevels = GetPages().moMaskLevels;
+    SetBitmapKind(*oEditor.GetPage(GetMask(nBitmap, oPlace).mnOffset), nBitmap, oDescription);
+    Refresh();
+    if (GetLevelBitmap() == nMask)
+        return;
+    RemoveMaskLevels(oLevels);
     Refresh();
 }
 
@@ -502,7 +512,7 @@ void TifDataset::SetBitmapMetadata(unsigned int nBitmap, const krv::datasources:
 
 krv::datasources::IOverviewManager* TifDataset::GetBitmapOverviewManager()
 {
-    if (GetPages().moMasks.empty())
+    if (GetLevelBitmap() == 0)
         return nullptr;
     return new TifOverviewManager(*this, PixelUse::eBitmap);
 }
@@ -605,7 +615,8 @@ void TifDataset::DeletePCT(unsigned int nPCT)
 
 std::uint64_t TifDataset::GetFullPage(PixelUse eUse) const
 {
-    return eUse == PixelUse::eImage ? mpoEditor->GetPages().front()->mnNumber : GetPages().moMasks.front().mnOffset;
+    return eUse == PixelUse::eImage ? mpoEditor->GetPages().front()->mnNumber
+                                    : GetMask(GetLevelBitmap(), Place::Current()).mnOffset;
 }
 
 const krv::datasources::AuxiliaryData& TifDataset::GetBook(PixelUse eUse) const
@@ -614,7 +625,8 @@ const krv::datasources::AuxiliaryData& TifDataset::GetBook(PixelUse eUse) const
     if (oFound != moBooks.end())
         return oFound->second;
     krv::datasources::AuxiliaryData oBook =
-        eUse == PixelUse::eImage ? ReadMetadata(GetPage()) : ReadPageMetadata(GetPages().moMasks.front().mnOffset);
+        eUse == PixelUse::eImage ? ReadMetadata(GetPage())
+                                 : ReadPageMetadata(GetMask(GetLevelBitmap(), Place::Current()).mnOffset);
     return moBooks[eUse] = std::move(oBook);
 }
 

@@ -70,7 +70,8 @@ public:
     void SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription) override;
     krv::datasources::MetadataMap GetBitmapMetadata(unsigned int nBitmap) const override;
     void SetBitmapMetadata(unsigned int nBitmap, const krv::datasources::MetadataMap& oMetadata) override;
-    // Reduced masks belong to the first bitmap.
+    // Reduced masks belong to the validity mask; where there is none, to a zone that is stored as a mask. They go when
+    // it becomes another bitmap.
     krv::datasources::IOverviewManager* GetBitmapOverviewManager() override;
 
     std::vector<unsigned int> GetPCTList() const override;
@@ -82,9 +83,9 @@ public:
     void SetPCTDescription(unsigned int nPCT, const std::string& oDescription) override;
     void DeletePCT(unsigned int nPCT) override;
 
-    // For the overview managers: the levels of the image or of the first bitmap, and the pixels of a page.
+    // For the overview managers: the levels of the image or of its mask, and the pixels of a page.
     const std::vector<PageLevel>& GetLevels(PixelUse eUse) const;
-    // The number of the bitmap that the mask levels belong to: the first one in the file.
+    // The number of the bitmap that the mask levels belong to; 0 when there is none.
     unsigned int GetLevelBitmap() const;
     std::shared_ptr<support::BlockImage> OpenPage(std::uint64_t nDirectory, PixelUse eUse);
     krv::datasources::AuxiliaryData ReadPageMetadata(std::uint64_t nDirectory) const;
@@ -108,7 +109,7 @@ private:
     void WriteBook(const krv::datasources::AuxiliaryData& oBook, PixelUse eUse, const Place& oPlace);
     void WatchImage();
     void InvalidateLevels();
-    void EditMask(unsigned int nBitmap, const krv::datasources::MetadataMap& oMetadata, const Place& oPlace);
+    void RemoveMaskLevels(const std::vector<PageLevel>& oLevels);
     void StorePCT(const krv::gobs::PCT& oTable, const Place& oPlace);
     std::unique_ptr<support::IBlockSource> MakeSource(const std::shared_ptr<PageModel>& poModel, PixelUse eUse);
     FileEditor& GetEditor(const char* pWhat, const Place& oPlace) const;

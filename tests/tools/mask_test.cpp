@@ -179,10 +179,33 @@ TEST_F(MaskCommand, NoDataIsStoredAsItsComplement)
     ASSERT_NE(any, all);
     EXPECT_TRUE(Written({"--no-data"}) == any);
     EXPECT_EQ(moReport["complement"], true);
-    EXPECT_EQ(moReport["set"], std::count(any.begin(), any.end(), '\0'));
-    EXPECT_TRUE(Written({"--no-data", "--rule", "all"}) == all);
+    EXPECT_EQ(moReport["validity"], true);
+    const std::int64_t nNone = std::count(any.begin(), any.end(), '\0');
+    EXPECT_EQ(moReport["set"], nNone);
+    krv::test::ExpectRefusals("mask", {{{moFile, "--no-data", "--write", "new"}, 2, "bitmap 1 is the validity mask"}});
+    for (char& cBit : all)
+        cBit ^= 1;
+    EXPECT_TRUE(Written({"--no-data", "--rule", "all", "--zone"}) == all) << "a zone is no complement";
+    EXPECT_EQ(moReport["validity"], false);
     const ProgramRun oRun = RunKrv({"mask", moFile, "--no-data", "--write", "1"});
     EXPECT_NE(oRun.output.find("complement"), std::string::npos) << oRun.output;
+
+    // It is honoured: a pixel that is zero in one channel takes part in none.
+    const json oFirst = RunKrv({"stats", moFile, "--json"}).Json()["channels"][0];
+    EXPECT_EQ(oFirst["valid"], WIDTH * HEIGHT - nNone);
+    EXPECT_EQ(oFirst["noData"].get<std::int64_t>() + oFirst["masked"].get<std::int64_t>(), nNone);
+    EXPECT_GT(oFirst["masked"], 0);
+    const json oRaw = RunKrv({"stats", moFile, "--json", "--raw"}).Json()["channels"][0];
+    EXPECT_EQ(oRaw["valid"], WIDTH * HEIGHT - oFirst["noData"].get<std::int64_t>());
+    EXPECT_EQ(oRaw["masked"], 0);
+
+    // Another bitmap takes its place.
+    EXPECT_EQ(RunKrv({"mask", moFile, "--bitmap", "1", "--write", "1", "--zone"}).code, 0);
+    EXPECT_EQ(RunKrv({"mask", moFile, "--bitmap", "2", "--write", "2", "--validity"}).code, 0);
+    const json oBitmaps = RunKrv({"info", moFile, "--json"}).Json()["bitmaps"];
+    EXPECT_EQ(oBitmaps[0]["description"], "Bitmap 1");
+    EXPECT_EQ(oBitmaps[1]["validity"], true);
+    EXPECT_EQ(RunKrv({"stats", moFile, "--json"}).Json()["channels"][0]["valid"], 0) << "no-data alone is set there";
 
     // Channels of several types, each with the value in its own type.
     const std::string mixed = moFolder.File("mixed.demo");
@@ -246,6 +269,8 @@ TEST_F(MaskCommand, FailuresSayWhyOnOneLineAndChangeNothing)
         {{moFile, "--bitmap", "7", "--write", "new"}, 2, "there is no bitmap 7; there are none"},
         {{moFile, "--no-data", "--write", "4"}, 2, "there is no bitmap 4"},
         {{moFile, "--no-data", "--write", "-1"}, 2, "--write"},
+        {{moFile, "--no-data", "--zone"}, 2, "--zone goes with --write"},
+        {{moFile, "--no-data", "--write", "new", "--zone", "--validity"}, 2, "--zone"},
         {{moFile, "--no-data", "--channels", "4"}, 2, "channel 4"},
         {{moFile, "--no-data", "--coordinates", "pixel"}, 2, "--polygon"},
         {{moFile, "--polygon", square, "--crs", "EPSG:4326", "--coordinates", "pixel"}, 2, "--crs"},

@@ -4,7 +4,6 @@
 #include "toolkit/exceptions/exceptions.h"
 #include "tools/krv/checksums.h"
 #include "tools/krv/errors.h"
-#include "tools/krv/nodatamatch.h"
 #include "tools/krv/progress.h"
 #include "tools/krv/reduction.h"
 #include "tools/krv/statistics.h"
@@ -101,37 +100,6 @@ TEST(Statistics, InterleavedAndComplexChannels)
     EXPECT_EQ(oMagnitude.noData, 1U);
     EXPECT_EQ(oMagnitude.minimum.get<double>(), 5.0);
     EXPECT_EQ(oMagnitude.maximum.get<double>(), 10.0);
-}
-
-template <typename T>
-bool Matches(const std::string& text, T nValue)
-{
-    return NoDataMatch<T>(krv::datasources::ParseNoData(text)).Matches(nValue);
-}
-
-TEST(NoDataMatch, ComparesInThePixelsOwnType)
-{
-    EXPECT_TRUE(Matches<std::uint8_t>(" 255 ", 255));
-    EXPECT_TRUE(Matches<std::int16_t>("-9999.0", -9999));
-    EXPECT_TRUE(Matches<std::int8_t>("-128", -128));
-    EXPECT_FALSE(Matches<std::uint8_t>("256", 0));
-    EXPECT_FALSE(Matches<std::uint8_t>("-1", 255));
-    EXPECT_FALSE(Matches<std::int32_t>("0.5", 0));
-    EXPECT_FALSE(Matches<std::int32_t>("nan", 0));
-    EXPECT_TRUE(Matches<float>("-3.4028234663852886e+38", std::numeric_limits<float>::lowest()));
-    EXPECT_TRUE(Matches<float>("-3.40282347e+38", std::numeric_limits<float>::lowest()));
-    EXPECT_FALSE(Matches<float>("-1e300", std::numeric_limits<float>::lowest()));
-    EXPECT_TRUE(Matches<float>("0.1", 0.1F));
-    EXPECT_TRUE(Matches<float>("-0", 0.0F));
-    EXPECT_TRUE(Matches<float>("NaN", std::nanf("")));
-    EXPECT_TRUE(Matches<double>("-inf", -std::numeric_limits<double>::infinity()));
-    EXPECT_TRUE(Matches<std::uint64_t>("18446744073709551615", ~0ULL));
-    EXPECT_FALSE(Matches<std::uint64_t>("18446744073709551615", ~0ULL - 1));
-    EXPECT_TRUE(Matches<std::uint64_t>("1.8446744073709552e19", ~0ULL));
-    EXPECT_FALSE(NoDataMatch<float>(std::nullopt).IsSet());
-    const NoDataMatch<float> oZero(krv::datasources::ParseNoData("0"));
-    EXPECT_TRUE(oZero.Matches(0.0F, 0.0F));
-    EXPECT_FALSE(oZero.Matches(0.0F, 1.0F));
 }
 
 // A synthetic image of channels of one type, cut into awkward tiles.

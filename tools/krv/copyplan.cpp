@@ -2,6 +2,7 @@
 
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/irasterdataset.h"
+#include "gobs/mask/samplematch.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 #include "tools/krv/errors.h"
@@ -26,7 +27,7 @@ void Warn(const std::string& message)
 
 bool Holds(const krv::gobs::DataType& oType, const krv::datasources::NoDataValue& oValue)
 {
-    return VisitPart(oType, [&oValue](auto nZero) { return ValueAs<decltype(nZero)>(oValue).has_value(); });
+    return VisitPart(oType, [&oValue](auto nZero) { return krv::gobs::ToSample<decltype(nZero)>(oValue).has_value(); });
 }
 
 } // namespace

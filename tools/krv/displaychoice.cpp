@@ -5,6 +5,7 @@
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/metadata/displaydefaults.h"
 #include "datasources/metadata/referencetag.h"
+#include "datasources/reader/validitysource.h"
 #include "gobs/raster/datatype.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/pixeltypes.h"
@@ -132,20 +133,6 @@ void UseFirst(const SourceFile& oFile, DisplayChoice& oChoice)
     oChoice.reason = "the first";
 }
 
-// Bitmaps with a description are somebody's; the first without one says which pixels are valid.
-unsigned int FindValidityMask(const SourceFile& oFile)
-{
-    const auto* const poBitmaps = dynamic_cast<krv::datasources::IBitmapDataset*>(&oFile.GetDataset());
-    if (poBitmaps == nullptr)
-        return 0;
-    for (const unsigned int nBitmap : poBitmaps->GetBitmapList())
-    {
-        if (poBitmaps->GetBitmapDescription(nBitmap).empty())
-            return nBitmap;
-    }
-    return 0;
-}
-
 void ChooseChannels(const SourceFile& oFile, const std::vector<unsigned int>& oWanted, DisplayChoice& oChoice)
 {
     if (!oWanted.empty())
@@ -173,7 +160,7 @@ void ChooseChannels(const SourceFile& oFile, const std::vector<unsigned int>& oW
 DisplayChoice ChooseDisplay(const SourceFile& oFile, const std::vector<unsigned int>& oWanted)
 {
     DisplayChoice oChoice;
-    oChoice.alphaChannel = FindRole(oFile, "alpha");
+    oChoice.alphaChannel = krv::datasources::FindAlpha(oFile.GetMetadata());
     ChooseChannels(oFile, oWanted, oChoice);
     if (std::find(oChoice.channels.begin(), oChoice.channels.end(), oChoice.alphaChannel) != oChoice.channels.end())
         oChoice.alphaChannel = 0;
@@ -188,7 +175,8 @@ DisplayChoice ChooseDisplay(const SourceFile& oFile, const std::vector<unsigned 
         oChoice.table = TableOf(oFile, oChoice.channels.front());
         oChoice.inverted = Lower(oFile.GetMetadata().GetFileMetadataValue("PHOTOMETRIC")) == "miniswhite";
     }
-    oChoice.maskBitmap = FindValidityMask(oFile);
+    if (const auto* const poBitmaps = dynamic_cast<krv::datasources::IBitmapDataset*>(&oFile.GetDataset()))
+        oChoice.maskBitmap = krv::datasources::FindValidityMask(*poBitmaps);
     return oChoice;
 }
 

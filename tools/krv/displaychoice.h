@@ -27,7 +27,7 @@ struct DisplayChoice
 
 // In this order: the channels asked for; the file's display defaults; a colour table of the first channel; channels
 // that are described as red, green and blue; the four inks of a separated image; the first three channels; the first.
-// A channel described as alpha is opacity unless it is asked for. Throws UsageError for channels that are not there,
+// The alpha channel is opacity unless it is asked for. Throws UsageError for channels that are not there,
 // and for two or more than three.
 DisplayChoice ChooseDisplay(const SourceFile& oFile, const std::vector<unsigned int>& oWanted);
 

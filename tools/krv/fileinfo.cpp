@@ -116,8 +116,11 @@ Json BitmapsToJson(const SourceFile& oFile)
     const auto* const poBitmaps = dynamic_cast<IBitmapDataset*>(&oFile.GetDataset());
     if (poBitmaps == nullptr)
         return oList;
+    const unsigned int nMask = krv::datasources::FindValidityMask(*poBitmaps);
     for (const unsigned int nBitmap : poBitmaps->GetBitmapList())
-        oList.push_back({{"number", nBitmap}, {"description", TextOrNull(poBitmaps->GetBitmapDescription(nBitmap))}});
+        oList.push_back({{"number", nBitmap},
+                         {"description", TextOrNull(poBitmaps->GetBitmapDescription(nBitmap))},
+                         {"validity", nBitmap == nMask}});
     return oList;
 }
 

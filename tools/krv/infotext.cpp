@@ -119,7 +119,9 @@ std::string InfoText(const Json& oInfo)
     text += oInfo["geocoding"].is_null() ? Line("geocoding", "-") : GeocodingText(oInfo["geocoding"]);
     text += OverviewsText(oInfo["overviews"]);
     for (const Json& oBitmap : oInfo["bitmaps"])
-        text += Line("bitmap", fmt::format("{}  {}", Text(oBitmap["number"]), Text(oBitmap["description"])));
+        text += Line("bitmap",
+                     fmt::format("{}  {}", Text(oBitmap["number"]),
+                                 oBitmap["validity"] == true ? "the validity mask" : Text(oBitmap["description"])));
     for (const Json& oTable : oInfo["colourTables"])
         text += Line("colours", fmt::format("table {} of channel {}, {} entries", Text(oTable["number"]),
                                             Text(oTable["channel"]), Text(oTable["entries"])));

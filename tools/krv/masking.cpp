@@ -2,6 +2,7 @@
 
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/maskbuilder/bitmapmaskbuilder.h"
 #include "datasources/maskbuilder/polygonmaskbuilder.h"
@@ -217,12 +218,14 @@ private:
 class BitmapTarget
 {
 public:
-    BitmapTarget(const SourceFile& oFile, unsigned int nBitmap, bool bComplement)
-        : mnBitmap(Choose(oFile, nBitmap)), mbComplement(bComplement), moWriter(&GetBitmaps(oFile), {mnBitmap})
+    BitmapTarget(const SourceFile& oFile, const MaskRequest& oRequest)
+        : mnBitmap(Choose(oFile, oRequest)), mbComplement(oRequest.noData && oRequest.kind == BitmapKind::eValidity),
+          moWriter(&GetBitmaps(oFile), {mnBitmap})
     {
     }
 
     unsigned int GetBitmap() const { return mnBitmap; }
+    bool IsComplement() const { return mbComplement; }
 
     void Add(const Mask& oMask)
     {
@@ -239,11 +242,24 @@ public:
     void Finish() { moWriter.Synchronize(); }
 
 private:
-    static unsigned int Choose(const SourceFile& oFile, unsigned int nBitmap)
+    static unsigned int Choose(const SourceFile& oFile, const MaskRequest& oRequest)
     {
+        auto& oBitmaps = GetBitmaps(oFile);
+        const bool bValidity = oRequest.kind == BitmapKind::eValidity;
+        const unsigned int nMask = krv::datasources::FindValidityMask(oBitmaps);
+        unsigned int nBitmap = oRequest.target.value_or(nMask);
+        if (nBitmap != 0)
+            CheckBitmap(oFile, nBitmap);
+        if (bValidity && nMask != 0 && nBitmap != nMask)
+            throw UsageError(fmt::format("{}: bitmap {} is the validity mask, and there is only one; --write {} "
+                                         "replaces it, --zone stores a zone beside it",
+                                         oFile.GetName(), nMask, nMask));
         if (nBitmap == 0)
-            return GetBitmaps(oFile).CreateBitmap();
-        CheckBitmap(oFile, nBitmap);
+            nBitmap = oBitmaps.CreateBitmap();
+        if (bValidity)
+            oBitmaps.SetBitmapDescription(nBitmap, "");
+        else if (oRequest.kind && oBitmaps.GetBitmapDescription(nBitmap).empty())
+            oBitmaps.SetBitmapDescription(nBitmap, fmt::format("Bitmap {}", nBitmap));
         return nBitmap;
     }
 
@@ -263,7 +279,8 @@ TileMasker MakeMasker(const SourceFile& oFile, const MaskRequest& oRequest)
 
 MaskResult MakeMask(const std::string& file, const MaskRequest& oRequest)
 {
-    const SourceFile oFile(file, oRequest.target ? eUpdate : eReadOnly);
+    const bool bWrites = oRequest.target || oRequest.kind;
+    const SourceFile oFile(file, bWrites ? eUpdate : eReadOnly);
     const unsigned int nWidth = oFile.GetRaster().GetWidth(), nHeight = oFile.GetRaster().GetHeight();
     if (std::max(nWidth, nHeight) > static_cast<unsigned int>(std::numeric_limits<int>::max()))
         throw krv::DataException(file + ": the image is too large for masks");
@@ -272,8 +289,8 @@ MaskResult MakeMask(const std::string& file, const MaskRequest& oRequest)
     if (!oRequest.picture.empty())
         oPicture.emplace(nWidth, nHeight, oRequest.pictureSize);
     std::optional<BitmapTarget> oTarget;
-    if (oRequest.target)
-        oTarget.emplace(oFile, *oRequest.target, oRequest.noData);
+    if (bWrites)
+        oTarget.emplace(oFile, oRequest);
 
     const LevelReader oGrid = oFile.Read({1});
     krv::gobs::TileIterator oTiles(nWidth, nHeight);
@@ -299,7 +316,10 @@ MaskResult MakeMask(const std::string& file, const MaskRequest& oRequest)
     {
         oTarget->Finish();
         oResult.bitmap = oTarget->GetBitmap();
-        oResult.complement = oRequest.noData;
+        oResult.complement = oTarget->IsComplement();
+        oResult.validity = krv::datasources::FindValidityMask(GetBitmaps(oFile)) == oResult.bitmap;
+        const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(oFile.GetRaster().GetOverviewManager());
+        oResult.levels = poLevels != nullptr && !poLevels->GetLevels().empty();
     }
     return oResult;
 }

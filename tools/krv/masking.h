@@ -20,6 +20,13 @@ enum class PolygonCoordinates
     eNamedMap // of another one
 };
 
+// As IBitmapDataset has them.
+enum class BitmapKind
+{
+    eZone,
+    eValidity
+};
+
 // A mask is made of one kind of source: polygons, bitmaps (union) or the recorded no-data values.
 struct MaskRequest
 {
@@ -31,7 +38,10 @@ struct MaskRequest
     krv::gobs::BkgdRule rule = krv::gobs::eAnyChannel;
     std::vector<unsigned int> channels; // of the no-data values; empty: all
     std::optional<unsigned int> target; // the bitmap to write, 0 for a new one
-    std::string picture;                // a PNG file to draw
+    // What the bitmap becomes; nothing: a new one is a zone, another stays what it is. A validity mask without a target
+    // goes into the one that there is or else into a new bitmap.
+    std::optional<BitmapKind> kind;
+    std::string picture; // a PNG file to draw
     unsigned int pictureSize = 1024;
 };
 
@@ -41,11 +51,13 @@ struct MaskResult
     std::uint64_t pixels = 0;
     unsigned int bitmap = 0; // the one that was written, 0 for none
     bool complement = false; // whether it holds the complement: set = valid
+    bool validity = false;   // whether it is the image's validity mask
+    bool levels = false;     // whether the image has levels that were made before
 };
 
 // Makes the mask tile by tile. Bits set are inside a polygon, set in a bitmap, or no-data; a picture shows them white.
-// A bitmap of the file gets them as they are but for no-data, where it gets the complement, set = valid, as mask
-// bitmaps are read everywhere. When something fails the file stays as it was.
+// A bitmap of the file gets them as they are, but the validity mask the complement of no-data: there set bits are valid
+// pixels. When something fails the file stays as it was. Throws UsageError for a second validity mask.
 MaskResult MakeMask(const std::string& file, const MaskRequest& oRequest);
 
 } // namespace krv::tool

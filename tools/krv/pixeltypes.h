@@ -1,12 +1,17 @@
 #pragma once
 
+#include "datasources/metadata/typednodata.h"
 #include "gobs/raster/datatype.h"
 
 #include <cstdint>
+#include <optional>
 #include <utility>
 
 namespace krv::tool
 {
+
+// A channel's no-data value, when it has one.
+using OptionalNoData = std::optional<krv::datasources::NoDataValue>;
 
 // Calls the function with a zero of the C++ type of one value, or of one part of a complex value. Throws DataException
 // for a type outside the table.

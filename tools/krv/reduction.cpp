@@ -1,8 +1,8 @@
 #include "tools/krv/reduction.h"
 
 #include "datasources/reader/irasterreader.h"
+#include "gobs/mask/samplematch.h"
 #include "gobs/raster/raster.h"
-#include "tools/krv/pixeltypes.h"
 #include "tools/krv/progress.h"
 
 #include <algorithm>
@@ -215,7 +215,7 @@ private:
             return !moNoData.Matches(*pPixel);
     }
 
-    NoDataMatch<T> moNoData;
+    krv::gobs::SampleMatch<T> moNoData;
     bool mbComplex;
 };
 

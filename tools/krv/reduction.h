@@ -1,6 +1,6 @@
 #pragma once
 
-#include "tools/krv/nodatamatch.h"
+#include "tools/krv/pixeltypes.h"
 
 #include <vector>
 

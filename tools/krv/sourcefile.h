@@ -3,7 +3,7 @@
 #include "datasources/interfaces/accessmode.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/raster/datatype.h"
-#include "tools/krv/nodatamatch.h"
+#include "tools/krv/pixeltypes.h"
 
 #include <memory>
 #include <string>

@@ -2,8 +2,10 @@
 
 #include "datasources/reader/irasterreader.h"
 #include "datasources/reader/rasterrange.h"
+#include "gobs/mask/imaskbuilder.h"
+#include "gobs/mask/mask.h"
+#include "gobs/mask/samplematch.h"
 #include "gobs/raster/raster.h"
-#include "tools/krv/pixeltypes.h"
 #include "tools/krv/progress.h"
 
 #include <algorithm>
@@ -212,20 +214,28 @@ private:
     SumsFor<T> moSums;
 };
 
+bool IsMasked(const unsigned char* pValid, std::uint64_t nPixel)
+{
+    return (pValid[nPixel / 8] & 128u >> nPixel % 8) == 0;
+}
+
 template <typename T>
 class RealGatherer : public StatisticsGatherer
 {
 public:
     explicit RealGatherer(const OptionalNoData& oNoData) : moNoData(oNoData) {}
 
-    void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride) override
+    void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride,
+             const unsigned char* pValid) override
     {
         const T* pFrom = reinterpret_cast<const T*>(pFirst);
         for (std::uint64_t nDone = 0; nDone < nPixels; nDone += RUN)
         {
             const auto n = static_cast<std::size_t>(std::min<std::uint64_t>(RUN, nPixels - nDone));
             const T* pRun = pFrom + nDone * nStride;
-            if (nStride == 1 && !moNoData.IsSet() && std::is_integral_v<T>)
+            if (pValid != nullptr)
+                moStatistics.Add(moValid.data(), SiftMasked(pRun, n, nStride, pValid + nDone / 8));
+            else if (nStride == 1 && !moNoData.IsSet() && std::is_integral_v<T>)
                 moStatistics.Add(pRun, n);
             else
                 moStatistics.Add(moValid.data(), Sift(pRun, n, nStride));
@@ -240,13 +250,13 @@ public:
     }
 
 private:
-    // Copies the valid values of a run to moValid and returns their number; counts the others.
-    std::size_t Sift(const T* pFrom, std::size_t n, unsigned int nStride)
+    // Copies the valid values of a run to moValid, from nAt on, and returns their number; counts the others.
+    std::size_t Sift(const T* pFrom, std::size_t n, unsigned int nStride, std::size_t nAt = 0)
     {
         if (!moNoData.IsSet() && std::is_integral_v<T>)
         {
             for (std::size_t i = 0; i < n; ++i)
-                moValid[i] = pFrom[i * nStride];
+                moValid[nAt + i] = pFrom[i * nStride];
             return n;
         }
         std::size_t nValid = 0, nNoData = 0;
@@ -254,7 +264,7 @@ private:
         {
             const T nValue = pFrom[i * nStride];
             const bool bNoData = moNoData.Matches(nValue);
-            moValid[nValid] = nValue;
+            moValid[nAt + nValid] = nValue;
             nNoData += bNoData ? 1 : 0;
             if constexpr (std::is_floating_point_v<T>)
                 nValid += !bNoData && std::fabs(nValue) <= std::numeric_limits<T>::max() ? 1 : 0;
@@ -265,6 +275,20 @@ private:
         if (nValid + nNoData != n)
             CountStrange(pFrom, n, nStride);
         return nValid;
+    }
+
+    std::size_t SiftMasked(const T* pFrom, std::size_t n, unsigned int nStride, const unsigned char* pValid)
+    {
+        std::size_t nKept = 0;
+        for (std::size_t i = 0; i < n; ++i)
+        {
+            const T nValue = pFrom[i * nStride];
+            if (!IsMasked(pValid, i))
+                nKept += Sift(&nValue, 1, 1, nKept);
+            else
+                ++(moNoData.Matches(nValue) ? moCounts.noData : moCounts.masked);
+        }
+        return nKept;
     }
 
     void CountStrange([[maybe_unused]] const T* pFrom, [[maybe_unused]] std::size_t n,
@@ -282,7 +306,7 @@ private:
         }
     }
 
-    NoDataMatch<T> moNoData;
+    krv::gobs::SampleMatch<T> moNoData;
     ChannelStatistics moCounts;
     RunStatistics<T> moStatistics;
     std::array<T, RUN> moValid;
@@ -294,7 +318,8 @@ class ComplexGatherer : public StatisticsGatherer
 public:
     explicit ComplexGatherer(const OptionalNoData& oNoData) : moNoData(oNoData) {}
 
-    void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride) override
+    void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride,
+             const unsigned char* pValid) override
     {
         const T* pFrom = reinterpret_cast<const T*>(pFirst);
         std::size_t nValid = 0;
@@ -304,6 +329,8 @@ public:
             const double nMagnitude = Magnitude(nReal, nImaginary);
             if (moNoData.Matches(nReal, nImaginary))
                 ++moCounts.noData;
+            else if (pValid != nullptr && IsMasked(pValid, i))
+                ++moCounts.masked;
             else if (std::isnan(static_cast<double>(nReal)) || std::isnan(static_cast<double>(nImaginary)))
                 ++moCounts.nan;
             else if (!std::isfinite(nMagnitude))
@@ -332,7 +359,7 @@ private:
         return std::is_same_v<T, double> ? std::hypot(nA, nB) : std::sqrt(nA * nA + nB * nB);
     }
 
-    NoDataMatch<T> moNoData;
+    krv::gobs::SampleMatch<T> moNoData;
     ChannelStatistics moCounts;
     RunStatistics<double> moStatistics;
     std::array<double, RUN> moValid;
@@ -354,7 +381,8 @@ std::unique_ptr<StatisticsGatherer> StatisticsGatherer::Make(const krv::gobs::Da
 }
 
 std::vector<ChannelStatistics> ComputeStatistics(krv::datasources::IRasterReader& oReader,
-                                                 const std::vector<OptionalNoData>& oNoData, Progress& oProgress)
+                                                 const std::vector<OptionalNoData>& oNoData,
+                                                 const krv::gobs::IMaskBuilder* pValidity, Progress& oProgress)
 {
     const unsigned int nChannels = oReader.GetChansCount();
     const auto nValueBytes = static_cast<std::size_t>(oReader.GetDataType().GetValueBits() / 8);
@@ -365,8 +393,12 @@ std::vector<ChannelStatistics> ComputeStatistics(krv::datasources::IRasterReader
     for (const std::unique_ptr<krv::gobs::Raster> poTile : krv::datasources::RasterRange(oReader))
     {
         const std::uint64_t nPixels = static_cast<std::uint64_t>(poTile->GetWidth()) * poTile->GetHeight();
+        const std::unique_ptr<const krv::gobs::Mask> poMask(pValidity != nullptr ? pValidity->BuildMask(*poTile)
+                                                                                 : nullptr);
+        const unsigned char* const pValid =
+            poMask != nullptr && poMask->CountSet() != nPixels ? poMask->GetBits() : nullptr;
         for (unsigned int c = 0; c < nChannels; ++c)
-            oGatherers[c]->Add(poTile->GetBuffer() + c * nValueBytes, nPixels, nChannels);
+            oGatherers[c]->Add(poTile->GetBuffer() + c * nValueBytes, nPixels, nChannels, pValid);
         oProgress.Advance(poTile->GetBufferSize());
     }
     std::vector<ChannelStatistics> oResults;

@@ -2,11 +2,13 @@
 
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/metadata/typednodata.h"
-#include "datasources/reader/rasteraccess.h"
+#include "datasources/reader/idatasetaccess.h"
 #include "datasources/reader/validitysource.h"
 #include "datasources/writer/irasterwriter.h"
 #include "gobs/mask/exactmaskdecision.h"
 #include "gobs/mask/mask.h"
+#include "gobs/mask/samplematch.h"
+#include "toolkit/nspio/warning.h"
 
 #include <cmath>
 #include <cstring>
@@ -25,9 +27,12 @@ using krv::gobs::Mask;
 
 std::unique_ptr<ValiditySource> MakeSource(IRasterWriter& oWriter)
 {
-    const auto* const poAccess = dynamic_cast<const RasterAccess*>(&oWriter);
+    const auto* const poAccess = dynamic_cast<const IDatasetAccess*>(&oWriter);
     if (poAccess != nullptr && poAccess->GetDataset() != nullptr)
         return std::make_unique<ValiditySource>(poAccess->GetDataset(), poAccess->GetChannels());
+    krv::nspio::Warning::Warn("Overviews: the writer does not show its dataset, so that a validity mask and an alpha "
+                              "channel that is not among the written ones take no part",
+                              "datasources/writer/overviewbuilder", 0);
     return std::make_unique<ValiditySource>(oWriter);
 }
 
@@ -36,46 +41,14 @@ bool IsSet(const unsigned char* pBits, std::size_t nBit)
     return (pBits[nBit / 8] & 128u >> nBit % 8) != 0;
 }
 
-// The value as a sample; nothing when the type has no such value. Widened texts
-// of the limits of 32R are these limits.
-template <typename T>
-std::optional<T> ToSample(const NoDataValue& oValue)
-{
-    if constexpr (std::is_floating_point_v<T>)
-    {
-        constexpr double LARGEST = static_cast<double>(std::numeric_limits<T>::max());
-        const double nValue = oValue.GetReal();
-        const bool bRounded = std::isfinite(nValue) && std::fabs(nValue) > LARGEST;
-        return bRounded ? static_cast<T>(std::copysign(LARGEST, nValue)) : static_cast<T>(nValue);
-    }
-    else
-    {
-        using Limits = std::numeric_limits<T>;
-        if (oValue.GetKind() == NoDataValue::eUnsigned)
-            return std::cmp_less_equal(oValue.GetUnsigned(), Limits::max())
-                       ? std::optional<T>(static_cast<T>(oValue.GetUnsigned()))
-                       : std::nullopt;
-        if (oValue.GetKind() == NoDataValue::eNegative)
-            return std::cmp_greater_equal(oValue.GetNegative(), Limits::min())
-                       ? std::optional<T>(static_cast<T>(oValue.GetNegative()))
-                       : std::nullopt;
-        const double nValue = oValue.GetReal();
-        const double nEnd = std::ldexp(1.0, Limits::digits);
-        if (sizeof(T) == 8 && nValue == nEnd)
-            return Limits::max();
-        if (nValue != std::trunc(nValue) || nValue < static_cast<double>(Limits::min()) || nValue >= nEnd)
-            return std::nullopt;
-        return static_cast<T>(nValue);
-    }
-}
-
 template <typename T>
 T Above(T nValue)
 {
+    const bool bUp = nValue < std::numeric_limits<T>::max();
     if constexpr (std::is_floating_point_v<T>)
-        return std::nextafter(nValue, std::numeric_limits<T>::infinity());
+        return std::nextafter(nValue, bUp ? std::numeric_limits<T>::infinity() : T(0));
     else
-        return nValue < std::numeric_limits<T>::max() ? static_cast<T>(nValue + 1) : static_cast<T>(nValue - 1);
+        return static_cast<T>(bUp ? nValue + 1 : nValue - 1);
 }
 
 // Complex values: the no-data value is that of the real part, the imaginary one
@@ -90,7 +63,7 @@ public:
         for (unsigned int nChannel = 1; nChannel <= oForm.mnChannels; ++nChannel)
         {
             const auto oValue = GetTypedNoData(oMetadata, nChannel);
-            const std::optional<T> oSample = oValue ? ToSample<T>(*oValue) : std::nullopt;
+            const std::optional<T> oSample = oValue ? krv::gobs::ToSample<T>(*oValue) : std::nullopt;
             Rule oRule{oSample.has_value(), oSample.value_or(T(0))};
             if (!oSample && bNaNIsNoData && std::is_floating_point_v<T>)
                 oRule = {true, std::numeric_limits<T>::quiet_NaN()};
@@ -143,7 +116,7 @@ SampleValidity::SampleValidity(IRasterWriter& oWriter, const OverviewOptions& oO
     if (mpoPixels == nullptr)
     {
         std::unique_ptr<ValiditySource> oSource = MakeSource(oWriter);
-        mbBitmap = oSource->HasBitmap();
+        mnBitmap = oSource->GetBitmap();
         if (oSource->HasNoData() || oSource->HasBitmap() || oSource->HasAlpha())
         {
             mpoOwned = std::move(oSource);

@@ -26,8 +26,8 @@ public:
 
     // Whether there is anything that could make a sample invalid.
     bool IsNeeded() const { return mpoPixels != nullptr || !moChannels.empty(); }
-    // Whether a mask bitmap takes part.
-    bool HasBitmap() const { return mbBitmap; }
+    // The number of the mask bitmap that takes part, or 0.
+    unsigned int GetBitmap() const { return mnBitmap; }
     // A byte per value of the raster, which has no margins; valid until the next
     // call.
     const unsigned char* Mark(const krv::gobs::Raster& oRaster);
@@ -44,7 +44,7 @@ private:
     std::unique_ptr<const krv::gobs::IMaskBuilder> mpoOwned;
     const krv::gobs::IMaskBuilder* mpoPixels = nullptr;
     std::vector<Channel> moChannels;
-    bool mbBitmap = false;
+    unsigned int mnBitmap = 0;
     std::vector<unsigned char> moBytes;
 };
 

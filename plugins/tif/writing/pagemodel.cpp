@@ -190,7 +190,11 @@ PageSummary PageModel::Summarise() const
     oPage.mbReduced =
         (nKind & FILETYPE_REDUCEDIMAGE) != 0 || moTags.GetNumber(TIFFTAG_OSUBFILETYPE, 0) == OFILETYPE_REDUCEDIMAGE;
     oPage.mbMask = (nKind & FILETYPE_MASK) != 0;
-    oPage.mbDescribed = moTags.Find(TIFFTAG_IMAGEDESCRIPTION) != nullptr;
+    oPage.mbPage = (nKind & FILETYPE_PAGE) != 0;
+    const Tag* const pText = moTags.Find(TIFFTAG_IMAGEDESCRIPTION);
+    // One that is not in memory is long.
+    oPage.mbDescribed = pText != nullptr && pText->mnType == TIFF_ASCII && pText->mnCount != 0 &&
+                        (pText->moBytes.empty() || pText->moBytes.front() != 0);
     oPage.mnNumber = ParsePageName(moTags.GetText(TIFFTAG_PAGENAME), oPage.mbReduced);
     return oPage;
 }
@@ -249,7 +253,17 @@ std::shared_ptr<PageModel> MakeReducedPage(const PageModel& oFull, std::uint32_t
     return poPage;
 }
 
-std::shared_ptr<PageModel> MakeMaskPage(const PageModel& oImage)
+void SetBitmapKind(PageModel& oPage, unsigned int nBitmap, const std::string& description)
+{
+    TagList& oTags = oPage.moTags;
+    const bool bZone = !description.empty();
+    oTags.SetNumber(TIFFTAG_SUBFILETYPE, TIFF_LONG, bZone ? FILETYPE_PAGE : FILETYPE_MASK);
+    oTags.SetNumber(TIFFTAG_PHOTOMETRIC, TIFF_SHORT, bZone ? PHOTOMETRIC_MINISBLACK : PHOTOMETRIC_MASK);
+    oTags.SetText(TIFFTAG_PAGENAME, MakePageName(nBitmap, false));
+    oTags.SetText(TIFFTAG_IMAGEDESCRIPTION, description);
+}
+
+std::shared_ptr<PageModel> MakeBitmapPage(const PageModel& oImage, unsigned int nBitmap)
 {
     auto poPage = std::make_shared<PageModel>(oImage.moTags.IsBigEndian());
     TagList& oTags = poPage->moTags;
@@ -258,12 +272,10 @@ std::shared_ptr<PageModel> MakeMaskPage(const PageModel& oImage)
                        nCompression == COMPRESSION_ZSTD || nCompression == COMPRESSION_PACKBITS;
     const auto nWidth = static_cast<std::uint32_t>(oImage.moTags.GetNumber(TIFFTAG_IMAGEWIDTH, 0));
     const auto nHeight = static_cast<std::uint32_t>(oImage.moTags.GetNumber(TIFFTAG_IMAGELENGTH, 0));
-    oTags.SetNumber(TIFFTAG_SUBFILETYPE, TIFF_LONG, FILETYPE_MASK);
     oTags.SetNumber(TIFFTAG_IMAGEWIDTH, TIFF_LONG, nWidth);
     oTags.SetNumber(TIFFTAG_IMAGELENGTH, TIFF_LONG, nHeight);
     oTags.SetNumber(TIFFTAG_BITSPERSAMPLE, TIFF_SHORT, 1);
     oTags.SetNumber(TIFFTAG_COMPRESSION, TIFF_SHORT, bKept ? nCompression : COMPRESSION_ADOBE_DEFLATE);
-    oTags.SetNumber(TIFFTAG_PHOTOMETRIC, TIFF_SHORT, PHOTOMETRIC_MASK);
     oTags.SetNumber(TIFFTAG_SAMPLESPERPIXEL, TIFF_SHORT, 1);
     oTags.SetNumber(TIFFTAG_PLANARCONFIG, TIFF_SHORT, PLANARCONFIG_CONTIG);
     oTags.SetNumber(TIFFTAG_SAMPLEFORMAT, TIFF_SHORT, SAMPLEFORMAT_UINT);
@@ -273,6 +285,7 @@ std::shared_ptr<PageModel> MakeMaskPage(const PageModel& oImage)
     else
         oTags.SetNumber(TIFFTAG_ROWSPERSTRIP, TIFF_LONG,
                         std::min<std::uint64_t>(oImage.moTags.GetNumber(TIFFTAG_ROWSPERSTRIP, UINT32_MAX), nHeight));
+    SetBitmapKind(*poPage, nBitmap, MakePageName(nBitmap, false));
     poPage->SetStriles(poPage->CountStriles());
     return poPage;
 }

@@ -9,6 +9,7 @@
 
 #include <cstdint>
 #include <memory>
+#include <string>
 #include <vector>
 
 namespace krv::plugins::tif
@@ -66,7 +67,10 @@ std::shared_ptr<PageModel> MakeImagePage(const NewImage& oImage, const CreateOpt
 // A page of another size with the layout, the samples and the codec of a page whose tags are all in memory: a level.
 std::shared_ptr<PageModel> MakeReducedPage(const PageModel& oFull, std::uint32_t nWidth, std::uint32_t nHeight);
 
-// A page of bits beside another: a bitmap.
-std::shared_ptr<PageModel> MakeMaskPage(const PageModel& oImage);
+// A page of bits beside the image: a zone, with its name for a description.
+std::shared_ptr<PageModel> MakeBitmapPage(const PageModel& oImage, unsigned int nBitmap);
+// Makes the page of a bitmap a zone with a description, which is a page of its own to other readers, or without one the
+// image's mask. Tags alone: the pixels stay.
+void SetBitmapKind(PageModel& oPage, unsigned int nBitmap, const std::string& description);
 
 } // namespace krv::plugins::tif

@@ -390,6 +390,11 @@ TEST_F(OverviewBuilderTest, OptionsChangeWhatIsValidAndWhatIsAveraged)
         oWriter.WriteRaster(&oRaster);
         oWriter.SetTileSize(0, 0); // counts as a pixel
         EXPECT_TRUE(BuildOverviews(oWriter, {2}, oCase.mpMethod, oOptions));
+        const std::unique_ptr<krv::datasources::IOverviewManager> oManager(
+            dynamic_cast<IRasterDataset&>(*oWriter.GetDataset()).GetOverviewManager());
+        EXPECT_EQ(oManager->GetResamplingName(), oOptions.mbPower                       ? "RMS"
+                                                 : std::string(oCase.mpMethod) == "max" ? "MAX"
+                                                                                        : "AVERAGE");
         const std::string level = ReadLevel(oWriter, 2);
         std::vector<float> oLevel(level.size() / sizeof(float));
         std::memcpy(oLevel.data(), level.data(), level.size());
@@ -411,6 +416,69 @@ TEST_F(OverviewBuilderTest, OptionsChangeWhatIsValidAndWhatIsAveraged)
     EXPECT_FLOAT_EQ(oRoot[1], 4);
     oCase.mpMethod = "max";
     EXPECT_EQ(Build({3, 4, -5, 1, 1, 0, 2, 2}, krv::gobs::eDT_C32R, {}), (std::vector<float>{-5, 1}));
+}
+
+// A writer of another family, which stands on one of ours.
+class OtherWriter : public IRasterWriter, public krv::datasources::IDatasetAccess
+{
+public:
+    explicit OtherWriter(BasicWriter& oWriter) : o(oWriter) {}
+    IDataset* GetDataset() const override { return o.GetDataset(); }
+    const Channels& GetChannels() const override { return o.GetChannels(); }
+    Raster* GetRaster(unsigned int n) override { return o.GetRaster(n); }
+    krv::datasources::RasterIterator FindRaster(unsigned int x, unsigned int y) override { return o.FindRaster(x, y); }
+    krv::datasources::RasterIterator Begin() override { return o.Begin(); }
+    krv::datasources::RasterIterator End() override { return o.End(); }
+    unsigned int GetTileCount() const override { return o.GetTileCount(); }
+    void SetOptimalTileSize() override { o.SetOptimalTileSize(); }
+    void SetTileSize(unsigned int w, unsigned int h) override { o.SetTileSize(w, h); }
+    unsigned int GetTileWidth() const override { return o.GetTileWidth(); }
+    unsigned int GetTileHeight() const override { return o.GetTileHeight(); }
+    const std::vector<krv::datasources::IChannelInfo*>& GetChannelsInfo() const override { return o.GetChannelsInfo(); }
+    krv::datasources::IFileFormat* GetFileFormat() const override { return o.GetFileFormat(); }
+    void SetMargins(unsigned int x, unsigned int y, eMarginBehaviour e) override { o.SetMargins(x, y, e); }
+    unsigned int GetXMargin() const override { return o.GetXMargin(); }
+    unsigned int GetYMargin() const override { return o.GetYMargin(); }
+    eMarginBehaviour GetMarginBehaviour() const override { return o.GetMarginBehaviour(); }
+    void ReadRaster(Raster* p) override { o.ReadRaster(p); }
+    Raster* ReadRaster(unsigned int x, unsigned int y, unsigned int w, unsigned int h) override
+    {
+        return o.ReadRaster(x, y, w, h);
+    }
+    krv::datasources::AuxiliaryData GetAuxiliaryData() const override { return o.GetAuxiliaryData(); }
+    krv::ogc::cs::ICRS* GetCRS() const override { return o.GetCRS(); }
+    krv::ogc::cs::GeocodingInfo* GetGeocodingInfo() const override { return o.GetGeocodingInfo(); }
+    krv::datasources::IOverviewReaderAccessor* GetOverviewReaderAccessor() override
+    {
+        return o.GetOverviewReaderAccessor();
+    }
+    unsigned int GetWidth() const override { return o.GetWidth(); }
+    unsigned int GetHeight() const override { return o.GetHeight(); }
+    unsigned int GetChansCount() const override { return o.GetChansCount(); }
+    const DataType& GetDataType() const override { return o.GetDataType(); }
+    void WriteRaster(const Raster* p) override { o.WriteRaster(p); }
+    bool FileExists() override { return o.FileExists(); }
+    void CreateNewFile(const krv::gobs::RasterInfo& oInfo) override { o.CreateNewFile(oInfo); }
+    void SetAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override { o.SetAuxiliaryData(oData); }
+    void SetCRS(const krv::ogc::cs::ICRS* p) override { o.SetCRS(p); }
+    void SetGeocodingInfo(const krv::ogc::cs::GeocodingInfo& oInfo) override { o.SetGeocodingInfo(oInfo); }
+    IOverviewWriterAccessor* GetOverviewWriterAccessor() override { return o.GetOverviewWriterAccessor(); }
+    void Synchronize() override { o.Synchronize(); }
+
+private:
+    BasicWriter& o;
+};
+
+TEST_F(OverviewBuilderTest, WritersOfOtherFamiliesKeepTheMask)
+{
+    const Case oCase{"AVERAGE", krv::gobs::eDT_8U, 2, {}, true, {2, 5}};
+    Picture oImage;
+    std::string bytes;
+    BasicWriter oWriter(Make(oCase, oImage, bytes));
+    OtherWriter oOther(oWriter);
+    ASSERT_TRUE(BuildOverviews(oOther, oCase.moFactors, oCase.mpMethod));
+    for (const unsigned int nFactor : oCase.moFactors)
+        ExpectLevel(oWriter, oCase, oImage, nFactor);
 }
 
 // All of the level is spoilt before; what the change does not reach stays so.

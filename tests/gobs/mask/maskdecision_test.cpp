@@ -2,6 +2,7 @@
 
 #include "gobs/mask/exactmaskdecision.h"
 #include "gobs/mask/mask.h"
+#include "gobs/mask/samplematch.h"
 #include "gobs/raster/raster.h"
 #include "tests/support/conversionmodel.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -146,6 +147,11 @@ bool Marks(NativeDataTypeCode eType, const SampleValue& oValue, Sample nSample, 
     const auto oBits = Mark(*oImpl, oPixels, 33, 1);
     // Vector and single pixels say the same.
     EXPECT_EQ(oBits[0], oBits[4] == 0x80 ? 0xFF : 0);
+    if constexpr (std::is_arithmetic_v<Sample>)
+    {
+        const bool bNaN = bNaNIsBackground && std::isnan(static_cast<double>(nSample));
+        EXPECT_EQ(oBits[4] != 0, bNaN || SampleMatch<Sample>(oValue).Matches(nSample));
+    }
     return oBits[4] != 0;
 }
 

@@ -18,6 +18,7 @@
 #include <poll.h>
 #include <sys/resource.h>
 #include <sys/wait.h>
+#include <tiffio.h>
 #include <unistd.h>
 
 namespace
@@ -557,6 +558,78 @@ TEST(TifUpdate, BitmapsKeepTheirNumbersAndAreWrittenTogether)
     EXPECT_EQ(poRead->GetBitmapDescription(1), "clouds");
     EXPECT_EQ(poRead->GetBitmapMetadata(3), (krv::datasources::MetadataMap{{"Kind", "water"}}));
     EXPECT_TRUE(ReadAll(*IOPointer(poRead->GetBitmapIO({3, 1})), 2) == oBits);
+}
+
+// Kind and photometric interpretation of each page, as libtiff has them.
+std::string KindsOf(const std::string& fileName)
+{
+    const std::unique_ptr<TIFF, void (*)(TIFF*)> poTiff(TIFFOpen(fileName.c_str(), "rm"), &TIFFClose);
+    std::string kinds;
+    do
+    {
+        std::uint32_t nKind = 0;
+        std::uint16_t nPhotometric = 0;
+        TIFFGetFieldDefaulted(poTiff.get(), TIFFTAG_SUBFILETYPE, &nKind);
+        TIFFGetField(poTiff.get(), TIFFTAG_PHOTOMETRIC, &nPhotometric);
+        kinds += std::to_string(nKind) + "/" + std::to_string(nPhotometric) + " ";
+    } while (TIFFReadDirectory(poTiff.get()) == 1);
+    return kinds;
+}
+
+// Zones are pages of their own, the validity mask is the image's mask, with its levels; each becomes the other.
+TEST(TifUpdate, BitmapsAreZonesOrTheValidityMask)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("k.tif");
+    const auto Change = [&fileName](const auto& oChange)
+    {
+        const TifPointer poDataset = OpenTif(fileName, eUpdate);
+        oChange(*poDataset);
+        poDataset->Close();
+        return KindsOf(fileName);
+    };
+    using krv::plugins::tif::TifDataset;
+    CreateTif(fileName, "", 60, 40, 1, krv::gobs::eDT_8U)->Close();
+    const Bytes oBits(60 * 40, 1);
+    const auto Add = [&](TifDataset& oDataset)
+    {
+        EXPECT_EQ(oDataset.CreateBitmap() + oDataset.CreateBitmap(), 3U);
+        EXPECT_EQ(oDataset.GetBitmapOverviewManager(), nullptr);
+        WriteAll(*IOPointer(oDataset.GetBitmapIO({2})), 1, oBits);
+    };
+    EXPECT_EQ(Change(Add), "0/1 2/1 2/1 ");
+    const auto MakeMask = [](TifDataset& oDataset)
+    {
+        EXPECT_EQ(FindValidityMask(oDataset), 0U);
+        oDataset.SetBitmapDescription(2, "");
+        const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(oDataset.GetBitmapOverviewManager());
+        poLevels->CreateLevel(2);
+        EXPECT_TRUE(poLevels->IsValid(2, 4) == false && poLevels->GetLevels() == std::vector<unsigned int>{2});
+        EXPECT_THROW(IOPointer(poLevels->GetOverviewIO(2, {1})), krv::DataException);
+    };
+    EXPECT_EQ(Change(MakeMask), "0/1 2/1 4/4 5/4 ");
+    const auto MakeZone = [&](TifDataset& oDataset)
+    {
+        EXPECT_EQ(FindValidityMask(oDataset), 2U);
+        EXPECT_EQ(oDataset.GetBitmapDescription(1), "Bitmap 1");
+        oDataset.SetBitmapDescription(2, "clouds");
+        EXPECT_EQ(FindValidityMask(oDataset), 0U);
+        EXPECT_TRUE(ReadAll(*IOPointer(oDataset.GetBitmapIO({2})), 1) == oBits);
+    };
+    EXPECT_EQ(Change(MakeZone), "0/1 2/1 2/1 ");
+    // As zones were stored once.
+    {
+        const std::unique_ptr<TIFF, void (*)(TIFF*)> poTiff(TIFFOpen(fileName.c_str(), "r+"), &TIFFClose);
+        TIFFSetDirectory(poTiff.get(), 1);
+        TIFFSetField(poTiff.get(), TIFFTAG_SUBFILETYPE, FILETYPE_MASK);
+        TIFFRewriteDirectory(poTiff.get());
+    }
+    const auto Nothing = [](TifDataset& oDataset)
+    {
+        EXPECT_EQ(FindValidityMask(oDataset), 0U);
+        EXPECT_EQ(oDataset.GetBitmapList(), (std::vector<unsigned int>{1, 2}));
+    };
+    EXPECT_EQ(Change(Nothing), "0/1 4/1 2/1 ");
 }
 
 // What the channels that stay have stays with them: pixels, levels, descriptions.

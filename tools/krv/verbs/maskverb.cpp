@@ -25,6 +25,8 @@ struct Options
     std::string channels;
     std::string rule;
     std::string write;
+    bool validity = false;
+    bool zone = false;
     bool json = false;
 };
 
@@ -63,6 +65,12 @@ void Settle(Options& oOptions)
     }
     if (!oOptions.write.empty())
         oRequest.target = ParseTarget(oOptions.write);
+    if (oOptions.zone && !oRequest.target)
+        throw UsageError("mask: --zone goes with --write");
+    if (oOptions.validity || (oRequest.noData && oRequest.target && !oOptions.zone))
+        oRequest.kind = BitmapKind::eValidity;
+    else if (oOptions.zone)
+        oRequest.kind = BitmapKind::eZone;
 }
 
 int RunMask(const std::string& file, Options& oOptions)
@@ -82,13 +90,17 @@ int RunMask(const std::string& file, Options& oOptions)
                       {"pixels", oResult.pixels},
                       {"bitmap", oResult.bitmap != 0 ? Json(oResult.bitmap) : Json()},
                       {"complement", oResult.complement},
+                      {"validity", oResult.validity},
                       {"picture", TextOrNull(oRequest.picture)}}));
         return 0;
     }
     std::string text = fmt::format("{} of {} pixels set ({})\n", oResult.set, oResult.pixels, pSource);
     if (oResult.bitmap != 0)
-        text += fmt::format("written to bitmap {}{}\n", oResult.bitmap,
-                            oResult.complement ? " as the complement: there a set bit is a valid pixel" : "");
+        text +=
+            fmt::format("written to bitmap {}{}{}\n", oResult.bitmap, oResult.complement ? " as the complement" : "",
+                        oResult.validity ? ", the image's validity mask: there a set bit is a valid pixel" : "");
+    if (oResult.validity && oResult.levels)
+        text += "the levels were made before: build them anew with krv overviews\n";
     if (!oRequest.picture.empty())
         text += fmt::format("drawn to {}: set pixels are white\n", oRequest.picture);
     Print(text);
@@ -127,8 +139,16 @@ void AddMaskVerb(CLI::App& oApp, Selection& oSelection)
         ->check(CLI::IsMember({"any", "all"}));
     poVerb->add_option("--channels", poOptions->channels, "No-data of these channels only, such as 1,3");
     poVerb->add_option("--write", poOptions->write,
-                       "Store it in this bitmap of the file, or in a new one (the word new). No-data is stored as its "
-                       "complement, so that set bits are valid pixels");
+                       "Store it in this bitmap of the file, or in a new one (the word new)");
+    auto* const poValidity = poVerb->add_flag(
+        "--validity", poOptions->validity,
+        "Store it as the image's validity mask, whose set bits are valid pixels: in the bitmap of "
+        "--write, else in the one that there is or a new one. No-data is stored so, as its complement, "
+        "unless --zone says otherwise");
+    poVerb
+        ->add_flag("--zone", poOptions->zone,
+                   "Store it as a zone, which says nothing of validity; the rule for all but no-data")
+        ->excludes(poValidity);
     poVerb->add_option("--png", poOptions->request.picture, "Draw it, set pixels white; the file is replaced");
     poVerb->add_option("--size", poOptions->request.pictureSize, "Longest side of the picture in pixels (1024)")
         ->check(CLI::Range(1, 16384));
