@@ -249,7 +249,7 @@ void ExpectNear(const json& oFound, const std::string& expected, double nLeeway,
 
 void CompareStatistics(const Facts& oFacts, const std::string& file)
 {
-    const auto oRun = RunKrv({"stats", file, "--json"});
+    const auto oRun = RunKrv({"stats", file, "--json", "--raw"});
     ASSERT_EQ(oRun.code, 0) << oRun.errors;
     const json oStatistics = oRun.Json();
     const double nPixels = std::stod(oFacts["width"]) * std::stod(oFacts["height"]);
