@@ -11,7 +11,7 @@ KRV_PACKAGES_BUILD=(g++ cmake ninja-build pkg-config
     libcli11-dev libfmt-dev nlohmann-json3-dev libpng-dev)
 KRV_PACKAGES_TEST=(libgtest-dev libgmock-dev)
 # What benchmarks compare with; nothing else needs them.
-KRV_PACKAGES_BENCH=(libcairo2-dev libagg-dev libvips-dev)
+KRV_PACKAGES_BENCH=(libcairo2-dev libagg-dev libvips-dev libvips-tools libtiff-tools)
 KRV_PACKAGES_FUZZ=(clang-16 libclang-rt-16-dev)
 KRV_PACKAGES_CI=(clang-format-14)
 

@@ -7,7 +7,9 @@
 #include <tiffio.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <stdexcept>
+#include <utility>
 
 namespace krv::benchmarks
 {
@@ -75,9 +77,41 @@ ByLibtiff::~ByLibtiff()
 
 const unsigned char* ByLibtiff::ReadTile(unsigned int nTile)
 {
-    if (TIFFReadEncodedTile(mpoTiff, nTile, moTile.data(), static_cast<tmsize_t>(moTile.size())) < 0)
-        throw std::runtime_error("libtiff cannot decode");
+    ReadTile(nTile, moTile.data());
     return moTile.data();
+}
+
+void ByLibtiff::ReadTile(unsigned int nTile, unsigned char* pTarget)
+{
+    if (TIFFReadEncodedTile(mpoTiff, nTile, pTarget, static_cast<tmsize_t>(moTile.size())) < 0)
+        throw std::runtime_error("libtiff cannot decode");
+}
+
+CachedTiles::CachedTiles(const SceneFile& oScene) : moSource(oScene), mnTileBytes(oScene.TileBytes())
+{
+    const unsigned long long nRows = 3 * oScene.TilesAcross() * oScene.TileBytes();
+    mnMost = std::clamp<unsigned long long>(nRows, 64ull << 20, 256ull << 20) / mnTileBytes;
+}
+
+const unsigned char* CachedTiles::ReadTile(unsigned int nTile)
+{
+    const auto oFound = moTiles.find(nTile);
+    if (oFound != moTiles.end())
+    {
+        moUses.splice(moUses.begin(), moUses, oFound->second.moUse);
+        return oFound->second.moBytes.data();
+    }
+    std::vector<unsigned char> oBytes;
+    if (moTiles.size() < mnMost)
+        oBytes.resize(mnTileBytes);
+    else
+    {
+        oBytes = std::move(moTiles.extract(moUses.back()).mapped().moBytes);
+        moUses.pop_back();
+    }
+    moSource.ReadTile(nTile, oBytes.data());
+    moUses.push_front(nTile);
+    return (moTiles[nTile] = {std::move(oBytes), moUses.begin()}).moBytes.data();
 }
 
 } // namespace krv::benchmarks

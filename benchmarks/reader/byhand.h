@@ -6,6 +6,8 @@
 #include "plugins/support/codec/zstddecoder.h"
 
 #include <cstdint>
+#include <list>
+#include <unordered_map>
 #include <vector>
 
 struct tiff;
@@ -49,10 +51,34 @@ public:
     ByLibtiff& operator=(const ByLibtiff&) = delete;
 
     const unsigned char* ReadTile(unsigned int nTile);
+    void ReadTile(unsigned int nTile, unsigned char* pTarget);
 
 private:
     tiff* mpoTiff;
     std::vector<unsigned char> moTile;
+};
+
+// The same behind a cache of tiles that holds as much as the library's does of the file: 64 MiB, or three rows of tiles
+// where that is more, at most 256 MiB; the least recently used go first.
+class CachedTiles
+{
+public:
+    explicit CachedTiles(const SceneFile& oScene);
+
+    const unsigned char* ReadTile(unsigned int nTile);
+
+private:
+    struct Tile
+    {
+        std::vector<unsigned char> moBytes;
+        std::list<unsigned int>::iterator moUse;
+    };
+
+    ByLibtiff moSource;
+    std::size_t mnTileBytes;
+    std::size_t mnMost;             // tiles
+    std::list<unsigned int> moUses; // the latest first
+    std::unordered_map<unsigned int, Tile> moTiles;
 };
 
 } // namespace krv::benchmarks

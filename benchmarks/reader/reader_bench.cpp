@@ -1,9 +1,12 @@
 // Measures reading through the library against the raw libraries underneath, in one process and interleaved rounds.
-//     krv_bench_reader FOLDER [--size N] [--only tiles|margins|windows|memory|threads|process] [--match TEXT]
+//     krv_bench_reader FOLDER [--size N] [--only tiles|margins|windows|wide|layouts|cold|memory|threads|process]
+//     [--match TEXT]
 // TEXT is looked for in what the scenes are called, such as "3x8U deflate". FOLDER takes the scenes (some gigabytes at
 // the full size of 8192) and keeps them for the next run.
 
 #include "benchmarks/reader/byhand.h"
+#include "benchmarks/reader/layouts.h"
+#include "benchmarks/reader/passes.h"
 #include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "benchmarks/support/scene.h"
@@ -15,7 +18,6 @@
 #include <fcntl.h>
 #include <spawn.h>
 #include <sys/mman.h>
-#include <sys/resource.h>
 #include <sys/wait.h>
 #include <tiffio.h>
 #include <unistd.h>
@@ -25,6 +27,7 @@
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
+#include <fstream>
 #include <memory>
 #include <random>
 #include <thread>
@@ -37,6 +40,7 @@ using krv::datasources::BasicReader;
 using krv::datasources::DatasetManager;
 using krv::gobs::Raster;
 
+constexpr unsigned int WIDE = 40960;
 constexpr unsigned long long BYTES_A_PASS = 192ull << 20;
 
 struct Settings
@@ -48,38 +52,17 @@ struct Settings
 
 const SceneKind KINDS[] = {{"3x8U", 3, 8, false}, {"1x16U", 1, 16, false}, {"4x32R", 4, 32, true}};
 
-std::unique_ptr<BasicReader> OpenScene(const SceneFile& oScene)
-{
-    return std::make_unique<BasicReader>(oScene.moPath, std::vector<unsigned int>());
-}
-
 // Whole rows of tiles, as many as make up a pass.
 unsigned int TilesOfPass(const SceneFile& oScene)
 {
     const unsigned long long nRowBytes = oScene.TileBytes() * oScene.TilesAcross();
-    const auto nRows = std::clamp<unsigned long long>(BYTES_A_PASS / nRowBytes, 1, oScene.TilesAcross());
+    const auto nRows = std::clamp<unsigned long long>(BYTES_A_PASS / nRowBytes, 1, oScene.TilesDown());
     return static_cast<unsigned int>(nRows) * oScene.TilesAcross();
-}
-
-void ReadTiles(BasicReader& oReader, unsigned int nBegin, unsigned int nEnd)
-{
-    for (unsigned int nTile = nBegin; nTile < nEnd; ++nTile)
-    {
-        const std::unique_ptr<Raster> oRaster(oReader.GetRaster(nTile));
-        Keep(oRaster->GetBuffer());
-    }
-}
-
-template <typename Source>
-void ReadTilesOf(Source& oSource, unsigned int nEnd)
-{
-    for (unsigned int nTile = 0; nTile < nEnd; ++nTile)
-        Keep(oSource.ReadTile(nTile));
 }
 
 std::string Rate(const SceneFile& oScene, unsigned int nTiles, double nSeconds)
 {
-    return Number(static_cast<double>(oScene.TileBytes()) * nTiles / nSeconds / 1e6, 0) + " MB/s";
+    return krv::benchmarks::Rate(static_cast<double>(oScene.TileBytes()) * nTiles, nSeconds);
 }
 
 // Every candidate must deliver the same pixels before it is worth a figure.
@@ -132,7 +115,7 @@ void MeasureTiles(const SceneFile& oScene, double nGoal)
 // tiles more than it has.
 void MeasureMargins(const SceneFile& oScene, unsigned int nMargin, double nGoal)
 {
-    const unsigned int nTiles = oScene.TilesAcross() * oScene.TilesAcross();
+    const unsigned int nTiles = oScene.TilesAcross() * oScene.TilesDown();
     const auto oPlain = OpenScene(oScene);
     const auto oMargins = OpenScene(oScene);
     oMargins->SetMargins(nMargin, nMargin, eMirror);
@@ -149,8 +132,8 @@ void MeasureMargins(const SceneFile& oScene, unsigned int nMargin, double nGoal)
                                       5);
     const double nSide = oScene.mnTile + 2.0 * nMargin;
     const double nMore = nSide * nSide / oScene.mnTile / oScene.mnTile;
-    PrintRow(oScene.moKind.moName + " " + oScene.moCodec + ", tiles of " + std::to_string(oScene.mnTile) + ", margin " +
-                 std::to_string(nMargin),
+    PrintRow(oScene.moKind.moName + " " + oScene.moCodec + ", " + std::to_string(oScene.mnSize) + " wide, tiles of " +
+                 std::to_string(oScene.mnTile) + ", margin " + std::to_string(nMargin),
              oTimes[0] / oTimes[1] * nMore, nGoal, Rate(oScene, nTiles, oTimes[1] / nMore));
 }
 
@@ -204,7 +187,7 @@ void CopyWindow(const SceneFile& oScene, unsigned int nX, unsigned int nY, std::
         }
 }
 
-void MeasureWindowsOfMapping(const SceneFile& oScene)
+void MeasurePlainWindows(const SceneFile& oScene)
 {
     const Windows oWindows = MakeWindows(oScene.mnSize);
     const auto oReader = OpenScene(oScene);
@@ -250,15 +233,15 @@ void MeasureWindowsOfMapping(const SceneFile& oScene)
                                       9);
     munmap(pMapping, nBytes);
     close(nFile);
-    PrintRow(oScene.moKind.moName + " none, windows of 300, against a mapping", oTimes[1] / oTimes[0], 0.45,
-             "stretch 0.55; a pread per tile by hand " + Number(oTimes[1] / oTimes[2]));
+    PrintRow(oScene.moKind.moName + " none, against one pread a tile by hand", oTimes[2] / oTimes[0], 0.95,
+             "against copies from a mapping, which the library has not, " + Number(oTimes[1] / oTimes[0]));
 }
 
-void MeasureWindowsOfLibtiff(const SceneFile& oScene)
+void MeasureDecodedWindows(const SceneFile& oScene)
 {
     const Windows oWindows = MakeWindows(oScene.mnSize);
     const auto oReader = OpenScene(oScene);
-    ByLibtiff oTiff(oScene);
+    CachedTiles oTiff(oScene);
     std::vector<unsigned char> oTarget(1ull * WINDOW * WINDOW * oScene.mnChannelsBytes());
     const auto oTimes = MedianSeconds({{"reader",
                                         [&]
@@ -274,8 +257,8 @@ void MeasureWindowsOfLibtiff(const SceneFile& oScene)
                                                            { return oTiff.ReadTile(nTile) + nBegin; });
                                         }}},
                                       5);
-    PrintRow(oScene.moKind.moName + " " + oScene.moCodec + ", windows of 300, against libtiff", oTimes[1] / oTimes[0],
-             1.3);
+    PrintRow(oScene.moKind.moName + " " + oScene.moCodec + ", against libtiff and the same cache",
+             oTimes[1] / oTimes[0], 0.95);
 }
 
 void MeasureEightRasters()
@@ -316,96 +299,168 @@ void MeasureEightRasters()
     }
 }
 
-// The same by hand says what the machine has for two threads at all.
-void MeasureTwoThreads(const SceneFile& oScene)
+// The same by hand says what the machine has for so many threads at all.
+void MeasureThreads(const SceneFile& oScene, unsigned int nThreads)
 {
     const unsigned int nTiles = TilesOfPass(oScene);
-    const auto oFirst = OpenScene(oScene);
-    const auto oSecond = OpenScene(oScene);
-    ByHand oFirstHand(oScene);
-    ByHand oSecondHand(oScene);
+    std::vector<std::unique_ptr<BasicReader>> oReaders;
+    std::vector<std::unique_ptr<ByHand>> oHands;
+    for (unsigned int n = 0; n < nThreads; ++n)
+    {
+        oReaders.push_back(OpenScene(oScene));
+        oHands.push_back(std::make_unique<ByHand>(oScene));
+    }
+    const auto InThreads = [nThreads](const auto& oRun)
+    {
+        std::vector<std::thread> oThreads;
+        for (unsigned int n = 1; n < nThreads; ++n)
+            oThreads.emplace_back(oRun, n);
+        oRun(0);
+        for (std::thread& oThread : oThreads)
+            oThread.join();
+    };
     const auto oTimes = MedianSeconds({{"one",
                                         [&]
                                         {
-                                            ReadTiles(*oFirst, 0, nTiles);
+                                            ReadTiles(*oReaders[0], 0, nTiles);
                                         }},
-                                       {"two",
+                                       {"threads",
                                         [&]
                                         {
-                                            std::thread oThread([&] { ReadTiles(*oFirst, 0, nTiles); });
-                                            ReadTiles(*oSecond, 0, nTiles);
-                                            oThread.join();
+                                            InThreads([&](unsigned int n) { ReadTiles(*oReaders[n], 0, nTiles); });
                                         }},
                                        {"one by hand",
                                         [&]
                                         {
-                                            ReadTilesOf(oFirstHand, nTiles);
+                                            ReadTilesOf(*oHands[0], nTiles);
                                         }},
-                                       {"two by hand",
+                                       {"threads by hand",
                                         [&]
                                         {
-                                            std::thread oThread([&] { ReadTilesOf(oFirstHand, nTiles); });
-                                            ReadTilesOf(oSecondHand, nTiles);
-                                            oThread.join();
+                                            InThreads([&](unsigned int n) { ReadTilesOf(*oHands[n], nTiles); });
                                         }}},
-                                      7);
-    PrintRow(oScene.moKind.moName + " " + oScene.moCodec + ", two threads with a reader each",
-             2 * oTimes[0] / oTimes[1], 1.8,
-             "by hand " + Number(2 * oTimes[2] / oTimes[3]) + "; two against two by hand " +
+                                      5);
+    PrintRow(oScene.moKind.moName + " " + oScene.moCodec + ", " + std::to_string(nThreads) +
+                 " threads with a reader each",
+             nThreads * oTimes[0] / oTimes[1], nThreads == 2 ? 1.8 : 0,
+             "by hand " + Number(nThreads * oTimes[2] / oTimes[3]) + "; against as many by hand " +
                  Number(oTimes[3] / oTimes[1]));
 }
 
-// Runs this program again with one word and the folder; seconds and the child's peak memory in MiB.
-void RunChild(const Settings& oSettings, const char* pWhat, double& nPeak)
+// Eight images open at once, a tile of each in turn, against the same tiles one image after the other.
+void MeasureEightReaders(const SceneFile& oScene)
 {
+    const unsigned int nTiles = std::max(1u, TilesOfPass(oScene) / 8);
+    std::vector<std::unique_ptr<BasicReader>> oReaders(8);
+    for (auto& oReader : oReaders)
+        oReader = OpenScene(oScene);
+    const auto oTimes = MedianSeconds({{"in turn",
+                                        [&]
+                                        {
+                                            for (unsigned int nTile = 0; nTile < nTiles; ++nTile)
+                                                for (const auto& oReader : oReaders)
+                                                    ReadTiles(*oReader, nTile, nTile + 1);
+                                        }},
+                                       {"one by one",
+                                        [&]
+                                        {
+                                            for (const auto& oReader : oReaders)
+                                                ReadTiles(*oReader, 0, nTiles);
+                                        }}},
+                                      5);
+    PrintRow(oScene.moKind.moName + " " + oScene.moCodec + ", eight readers in turn", oTimes[1] / oTimes[0], 0.9,
+             Rate(oScene, 8 * nTiles, oTimes[0]));
+}
+
+// The file is thrown out of the system's cache before every pass.
+void MeasureColdFile(const SceneFile& oScene)
+{
+    const unsigned int nTiles = TilesOfPass(oScene);
+    const int nFile = open(oScene.moPath.c_str(), O_RDONLY);
+    fsync(nFile);
+    std::vector<double> oTimes[2];
+    for (int nPass = 0; nPass < 10; ++nPass)
+    {
+        posix_fadvise(nFile, 0, 0, POSIX_FADV_DONTNEED);
+        const auto oReader = OpenScene(oScene);
+        ByHand oHand(oScene);
+        posix_fadvise(nFile, 0, 0, POSIX_FADV_DONTNEED);
+        oTimes[nPass % 2].push_back(Seconds(
+            [&]
+            {
+                if (nPass % 2 == 0)
+                    ReadTiles(*oReader, 0, nTiles);
+                else
+                    ReadTilesOf(oHand, nTiles);
+            }));
+    }
+    close(nFile);
+    PrintRow(oScene.moKind.moName + " " + oScene.moCodec + ", cold file, against the same by hand",
+             Median(oTimes[1]) / Median(oTimes[0]), 0.95, Rate(oScene, nTiles, Median(oTimes[0])));
+}
+
+// Runs this program again with one word and the folder; the peak memory, in MiB, is what the child itself says at its
+// end: what the system counts for it may begin at the peak of its parent.
+double RunChild(const Settings& oSettings, const char* pWhat)
+{
+    int oPipe[2];
+    posix_spawn_file_actions_t oActions;
+    if (pipe(oPipe) != 0 || posix_spawn_file_actions_init(&oActions) != 0)
+        throw std::runtime_error("no pipe to a child");
+    posix_spawn_file_actions_adddup2(&oActions, oPipe[1], STDOUT_FILENO);
     const char* oArguments[] = {oSettings.moSelf.c_str(), "--child", pWhat, oSettings.moFolder.c_str(), nullptr};
     pid_t nChild = 0;
-    if (posix_spawn(&nChild, oSettings.moSelf.c_str(), nullptr, nullptr, const_cast<char**>(oArguments), environ) != 0)
+    if (posix_spawn(&nChild, oSettings.moSelf.c_str(), &oActions, nullptr, const_cast<char**>(oArguments), environ) !=
+        0)
         throw std::runtime_error("cannot start a child");
+    posix_spawn_file_actions_destroy(&oActions);
+    close(oPipe[1]);
+    long nPeak = 0;
+    const bool bTold = read(oPipe[0], &nPeak, sizeof nPeak) == sizeof nPeak;
+    close(oPipe[0]);
     int nStatus = 0;
-    rusage oUsage{};
-    wait4(nChild, &nStatus, 0, &oUsage);
-    if (nStatus != 0)
+    waitpid(nChild, &nStatus, 0);
+    if (nStatus != 0 || !bTold)
         throw std::runtime_error(std::string("the child failed: ") + pWhat);
-    nPeak = static_cast<double>(oUsage.ru_maxrss) / 1024;
+    return static_cast<double>(nPeak) / 1024;
 }
 
 int BeChild(const std::string& what, const std::string& folder)
 {
-    if (what == "nothing")
-        return 0;
-    DatasetManager::GetInstance();
+    if (what != "nothing")
+        DatasetManager::GetInstance();
     if (what == "sparse")
     {
         BasicReader oReader(MakeSparse(folder, 100000, 256));
         oReader.SetMargins(8, 8, eMirror);
         ReadTiles(oReader, 0, oReader.GetTileCount());
     }
-    return 0;
+    long nPeak = 0;
+    std::ifstream oStatus("/proc/self/status");
+    for (std::string line; std::getline(oStatus, line);)
+        std::sscanf(line.c_str(), "VmHWM: %ld", &nPeak);
+    return write(STDOUT_FILENO, &nPeak, sizeof nPeak) == sizeof nPeak ? 0 : 1;
 }
 
 void MeasureProcess(const Settings& oSettings)
 {
-    double nPeak = 0;
     const auto oTimes = MedianSeconds({{"nothing",
                                         [&]
                                         {
-                                            RunChild(oSettings, "nothing", nPeak);
+                                            RunChild(oSettings, "nothing");
                                         }},
                                        {"instance",
                                         [&]
                                         {
-                                            RunChild(oSettings, "instance", nPeak);
+                                            RunChild(oSettings, "instance");
                                         }}},
                                       21);
     PrintRow("first GetInstance, milliseconds above a process", (oTimes[1] - oTimes[0]) * 1000, 0, "at most 15");
 
     MakeSparse(oSettings.moFolder, 100000, 256);
-    double nInstancePeak = 0;
-    RunChild(oSettings, "instance", nInstancePeak);
-    RunChild(oSettings, "sparse", nPeak);
-    PrintRow("sparse 100000 x 100000 with margins, MiB above", nPeak - nInstancePeak, 0,
-             "at most the cache's bound + 32");
+    const double nInstance = RunChild(oSettings, "instance");
+    PrintRow("sparse 100000 x 100000 with margins, MiB above", RunChild(oSettings, "sparse") - nInstance, 0,
+             "at most the cache's bound + 32; the process alone " + Number(nInstance, 1));
 }
 
 void MeasureOpening(const SceneFile& oScene)
@@ -425,7 +480,7 @@ void MeasureOpening(const SceneFile& oScene)
                                                 TIFFClose(TIFFOpen(oScene.moPath.c_str(), "r"));
                                         }}},
                                       3);
-    PrintRow("10,000 opens, time against TIFFOpen and TIFFClose", oTimes[0] / oTimes[1], 0, "at most 1.5");
+    PrintRow("10,000 opens, time against TIFFOpen and TIFFClose", oTimes[0] / oTimes[1], 0, "at most 1.2");
 }
 
 double GoalOf(const std::string& codec)
@@ -464,9 +519,29 @@ void MeasureAll(const Settings& oSettings, const Arguments& oArguments)
         PrintHeading("1,000 random windows of 300 x 300");
         for (const auto& [oKind, codec] : oScenes)
             if (!oKind.mbReal && codec == "none")
-                MeasureWindowsOfMapping(oMake(oKind, codec, 256));
+                MeasurePlainWindows(oMake(oKind, codec, 256));
             else if (!oKind.mbReal && codec == "deflate")
-                MeasureWindowsOfLibtiff(oMake(oKind, codec, 256));
+                MeasureDecodedWindows(oMake(oKind, codec, 256));
+    }
+    if (oArguments.Wants("wide"))
+    {
+        PrintHeading("Wide images, per byte delivered against the same run without margins");
+        for (const auto& [oKind, codec] : oScenes)
+            if (oKind.mnChannels == 3)
+                MeasureMargins(MakeScene(oSettings.moFolder, oKind, codec, 256, WIDE, oSettings.mnSize / 4), 8,
+                               codec == "none" ? 0.6 : 0.95);
+    }
+    if (oArguments.Wants("layouts"))
+    {
+        PrintHeading("Other layouts, against libtiff and a plain loop");
+        MeasureLayouts(oSettings.moFolder, oSettings.mnSize, oArguments.GetOption("match"));
+    }
+    if (oArguments.Wants("cold"))
+    {
+        PrintHeading("Files that the system has not in its cache");
+        for (const auto& [oKind, codec] : oScenes)
+            if (oKind.mnChannels == 3)
+                MeasureColdFile(oMake(oKind, codec, 256));
     }
     if (oArguments.Wants("memory"))
     {
@@ -475,10 +550,14 @@ void MeasureAll(const Settings& oSettings, const Arguments& oArguments)
     }
     if (oArguments.Wants("threads"))
     {
-        PrintHeading("Threads");
+        PrintHeading("Threads, and many readers");
         for (const auto& [oKind, codec] : oScenes)
             if (oKind.mnChannels == 3)
-                MeasureTwoThreads(oMake(oKind, codec, 256));
+            {
+                for (const unsigned int nThreads : {2u, 8u})
+                    MeasureThreads(oMake(oKind, codec, 256), nThreads);
+                MeasureEightReaders(oMake(oKind, codec, 256));
+            }
     }
     if (oArguments.Wants("process"))
     {
@@ -495,7 +574,8 @@ int main(int nArguments, char** pArguments)
     if (nArguments == 4 && std::strcmp(pArguments[1], "--child") == 0)
         return BeChild(pArguments[2], pArguments[3]);
     const Arguments oArguments(nArguments, pArguments,
-                               "FOLDER [--size N] [--only tiles|margins|windows|memory|threads|process] "
+                               "FOLDER [--size N] [--only "
+                               "tiles|margins|windows|wide|layouts|cold|memory|threads|process] "
                                "[--match TEXT]");
     const Settings oSettings{oArguments.GetWords().front(), oArguments.GetNumber("size", 8192),
                              std::filesystem::read_symlink("/proc/self/exe").string()};

@@ -2,6 +2,7 @@
 
 #include <tiffio.h>
 
+#include <algorithm>
 #include <cmath>
 #include <cstdint>
 #include <cstdio>
@@ -79,7 +80,7 @@ void SetTags(TIFF* poTiff, const SceneFile& oScene)
 {
     const SceneKind& oKind = oScene.moKind;
     TIFFSetField(poTiff, TIFFTAG_IMAGEWIDTH, oScene.mnSize);
-    TIFFSetField(poTiff, TIFFTAG_IMAGELENGTH, oScene.mnSize);
+    TIFFSetField(poTiff, TIFFTAG_IMAGELENGTH, oScene.mnHeight == 0 ? oScene.mnSize : oScene.mnHeight);
     TIFFSetField(poTiff, TIFFTAG_SAMPLESPERPIXEL, oKind.mnChannels);
     TIFFSetField(poTiff, TIFFTAG_BITSPERSAMPLE, oKind.mnBits);
     TIFFSetField(poTiff, TIFFTAG_SAMPLEFORMAT, oKind.mbReal ? SAMPLEFORMAT_IEEEFP : SAMPLEFORMAT_UINT);
@@ -91,8 +92,11 @@ void SetTags(TIFF* poTiff, const SceneFile& oScene)
         const std::vector<std::uint16_t> oExtra(oKind.mnChannels - 1, EXTRASAMPLE_UNSPECIFIED);
         TIFFSetField(poTiff, TIFFTAG_EXTRASAMPLES, static_cast<unsigned int>(oExtra.size()), oExtra.data());
     }
-    TIFFSetField(poTiff, TIFFTAG_TILEWIDTH, oScene.mnTile);
-    TIFFSetField(poTiff, TIFFTAG_TILELENGTH, oScene.mnTile);
+    if (oScene.mnTile != 0)
+    {
+        TIFFSetField(poTiff, TIFFTAG_TILEWIDTH, oScene.mnTile);
+        TIFFSetField(poTiff, TIFFTAG_TILELENGTH, oScene.mnTile);
+    }
     if (oScene.moCodec == "none")
         return;
     const bool bDeflate = oScene.moCodec == "deflate";
@@ -110,6 +114,7 @@ std::vector<std::vector<unsigned char>> MakeTiles(const SceneFile& oScene)
 {
     SceneFile oPeriod = oScene;
     oPeriod.mnSize = PERIOD;
+    oPeriod.mnHeight = PERIOD;
     const std::string path = oScene.moPath + ".period";
     std::vector<std::vector<float>> oTerrain;
     for (unsigned int nChannel = 0; nChannel < oScene.moKind.mnChannels; ++nChannel)
@@ -151,11 +156,11 @@ std::vector<std::vector<unsigned char>> MakeTiles(const SceneFile& oScene)
 } // namespace
 
 SceneFile MakeScene(const std::string& folder, const SceneKind& oKind, const std::string& codec, unsigned int nTile,
-                    unsigned int nSize)
+                    unsigned int nSize, unsigned int nHeight)
 {
-    SceneFile oScene{oKind, codec, nTile, nSize, {}};
-    oScene.moPath =
-        folder + "/" + oKind.moName + "_" + codec + "_" + std::to_string(nTile) + "_" + std::to_string(nSize) + ".tif";
+    SceneFile oScene{oKind, codec, nTile, nSize, {}, nHeight};
+    oScene.moPath = folder + "/" + oKind.moName + "_" + codec + "_" + std::to_string(nTile) + "_" +
+                    std::to_string(nSize) + (nHeight == 0 ? "" : "x" + std::to_string(nHeight)) + ".tif";
     if (std::filesystem::exists(oScene.moPath))
         return oScene;
     const auto oTiles = MakeTiles(oScene);
@@ -165,7 +170,7 @@ SceneFile MakeScene(const std::string& folder, const SceneKind& oKind, const std
         SetTags(oTiff.get(), oScene);
         const unsigned int nAcross = oScene.TilesAcross();
         const unsigned int nPeriodAcross = PERIOD / nTile;
-        for (unsigned int nIndex = 0; nIndex < nAcross * nAcross; ++nIndex)
+        for (unsigned int nIndex = 0; nIndex < nAcross * oScene.TilesDown(); ++nIndex)
         {
             auto oTile = oTiles[(nIndex / nAcross % nPeriodAcross) * nPeriodAcross + nIndex % nAcross % nPeriodAcross];
             TIFFWriteRawTile(oTiff.get(), nIndex, oTile.data(), static_cast<tmsize_t>(oTile.size()));
@@ -173,6 +178,62 @@ SceneFile MakeScene(const std::string& folder, const SceneKind& oKind, const std
     }
     std::filesystem::rename(path, oScene.moPath);
     return oScene;
+}
+
+std::string MakeLayout(const std::string& folder, const Layout& oLayout, unsigned int nSize)
+{
+    constexpr unsigned int STRIP = 16;
+    std::string path = folder + "/layout_" + oLayout.moName + "_" + std::to_string(nSize) + ".tif";
+    std::replace(path.begin(), path.end(), ' ', '_');
+    if (std::filesystem::exists(path))
+        return path;
+    std::vector<std::vector<float>> oTerrain;
+    for (unsigned int nChannel = 0; nChannel < oLayout.mnChannels; ++nChannel)
+        oTerrain.push_back(MakeTerrain(11 + nChannel));
+    {
+        const Tiff oTiff = OpenForWriting(path + ".part");
+        TIFF* const poTiff = oTiff.get();
+        SetTags(poTiff, {{"", oLayout.mnChannels, oLayout.mnBits, false}, "none", oLayout.mnTile, nSize, path});
+        TIFFSetField(poTiff, TIFFTAG_COMPRESSION, oLayout.mnCompression);
+        TIFFSetField(poTiff, TIFFTAG_PLANARCONFIG, oLayout.mbSeparate ? PLANARCONFIG_SEPARATE : PLANARCONFIG_CONTIG);
+        if (oLayout.mnCompression == COMPRESSION_JPEG && oLayout.mnChannels == 3)
+        {
+            TIFFSetField(poTiff, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_YCBCR);
+            TIFFSetField(poTiff, TIFFTAG_JPEGCOLORMODE, JPEGCOLORMODE_RGB);
+        }
+        if (oLayout.mnTile == 0)
+            TIFFSetField(poTiff, TIFFTAG_ROWSPERSTRIP, STRIP);
+        const unsigned int nWide = oLayout.mnTile == 0 ? nSize : oLayout.mnTile;
+        const unsigned int nHigh = oLayout.mnTile == 0 ? STRIP : oLayout.mnTile;
+        const unsigned int nAcross = nSize / nWide, nPlane = nAcross * (nSize / nHigh);
+        const unsigned int nInBlock = oLayout.mbSeparate ? 1 : oLayout.mnChannels;
+        std::vector<unsigned char> oBlock(std::size_t{nWide} * nHigh * nInBlock * oLayout.mnBits / 8);
+        for (unsigned int nBlock = 0; nBlock < nPlane * oLayout.mnChannels / nInBlock; ++nBlock)
+        {
+            std::fill(oBlock.begin(), oBlock.end(), static_cast<unsigned char>(0));
+            std::size_t nAt = 0;
+            for (unsigned int y = 0; y < nHigh; ++y)
+                for (unsigned int x = 0; x < nWide; ++x)
+                    for (unsigned int c = 0; c < nInBlock; ++c, ++nAt)
+                    {
+                        const unsigned int nRow = nBlock % nPlane / nAcross * nHigh + y;
+                        const unsigned int nColumn = nBlock % nPlane % nAcross * nWide + x;
+                        const float nHeight =
+                            oTerrain[nBlock / nPlane + c][std::size_t{nRow % PERIOD} * PERIOD + nColumn % PERIOD];
+                        if (oLayout.mnBits == 1)
+                            oBlock[nAt / 8] |= nHeight > 0.5F ? 128U >> nAt % 8 : 0U;
+                        else
+                            StoreSample(&oBlock[nAt], nHeight, {"", 1, 8, false});
+                    }
+            const auto nBytes = static_cast<tmsize_t>(oBlock.size());
+            const tmsize_t nWritten = oLayout.mnTile == 0 ? TIFFWriteEncodedStrip(poTiff, nBlock, oBlock.data(), nBytes)
+                                                          : TIFFWriteEncodedTile(poTiff, nBlock, oBlock.data(), nBytes);
+            if (nWritten != nBytes)
+                throw std::runtime_error("libtiff cannot write " + path);
+        }
+    }
+    std::filesystem::rename(path + ".part", path);
+    return path;
 }
 
 std::string MakeSparse(const std::string& folder, unsigned int nSize, unsigned int nTile)

@@ -220,7 +220,7 @@ Times WriteByVips(Pixels& oPixels, const std::string& codecName, const std::stri
     const auto eCodec = codecName == "none"   ? VIPS_FOREIGN_TIFF_COMPRESSION_NONE
                         : codecName == "zstd" ? VIPS_FOREIGN_TIFF_COMPRESSION_ZSTD
                                               : VIPS_FOREIGN_TIFF_COMPRESSION_DEFLATE;
-    const int nLevel = codecName == "zstd" ? ZSTD_LEVEL : 0;
+    const int nLevel = codecName == "zstd" ? ZSTD_LEVEL : DEFLATE_LEVEL;
     if (vips_tiffsave(poImage, file.c_str(), "tile", TRUE, "tile_width", static_cast<int>(TILE), "tile_height",
                       static_cast<int>(TILE), "compression", eCodec, "predictor",
                       VIPS_FOREIGN_TIFF_PREDICTOR_HORIZONTAL, "level", nLevel, nullptr) != 0)
@@ -294,11 +294,11 @@ void Measure(Pixels& oPixels, const std::string& codecName, const std::string& f
     CheckEqual(oPixels, oHand, codecName, folder);
     std::vector<Writer> oWriters = {[&](const std::string& file) { return WriteByLibrary(oPixels, codecName, file); },
                                     [&](const std::string& file) { return oHand.Write(oPixels, file); },
-                                    [&](const std::string& file) { return WriteByLibtiff(oPixels, codecName, file); },
                                     [&](const std::string& file)
                                     {
-                                        return WriteByLibrary(oPixels, codecName, file, " INTERLEAVE=BAND");
+                                        return WriteByLibtiff(oPixels, codecName, file);
                                     }};
+    constexpr std::size_t VIPS = 3;
 #ifdef KRV_HAVE_VIPS
     oWriters.emplace_back([&](const std::string& file) { return WriteByVips(oPixels, codecName, file); });
 #endif
@@ -313,8 +313,8 @@ void Measure(Pixels& oPixels, const std::string& codecName, const std::string& f
     };
     std::string remarks = Number(static_cast<double>(oPixels.moTiles.size()) / oTimes[0].mnWritten / 1e6, 0) +
                           " MB/s; libtiff " + Number(Ratio(2));
-    if (nBands > 3)
-        remarks += ", libvips " + Number(Ratio(3));
+    if (nBands > VIPS)
+        remarks += ", libvips " + Number(Ratio(VIPS));
     PrintRow(codecName + ", new file", Ratio(0), nGoal, remarks);
     PrintRow(codecName + ", new file, until it is on the disk", oTimes[1].mnSafe / oTimes[0].mnSafe, 0,
              "libtiff " + Number(oTimes[1].mnSafe / oTimes[2].mnSafe));

@@ -1,0 +1,134 @@
+// Measures the command line beside `vips` and `tiffcp`, whole processes on warm files, one thread each, the new files
+// safe on the disk by krv and left to the system to write by the others; a program that is not installed is left out.
+//     krv_bench_command FOLDER [--size N]
+// FOLDER keeps the scenes for the next run.
+
+#include "benchmarks/support/arguments.h"
+#include "benchmarks/support/measure.h"
+#include "benchmarks/support/scene.h"
+
+#include <fcntl.h>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <tiffio.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <filesystem>
+#include <stdexcept>
+
+namespace
+{
+
+using namespace krv::benchmarks;
+using Words = std::vector<std::string>;
+
+// False when there is no such program; an exception when it fails. What it prints is dropped.
+bool Run(const Words& oWords)
+{
+    std::vector<char*> oArguments;
+    for (const std::string& word : oWords)
+        oArguments.push_back(const_cast<char*>(word.c_str()));
+    oArguments.push_back(nullptr);
+    posix_spawn_file_actions_t oActions;
+    posix_spawn_file_actions_init(&oActions);
+    for (const int nStream : {STDOUT_FILENO, STDERR_FILENO})
+        posix_spawn_file_actions_addopen(&oActions, nStream, "/dev/null", O_WRONLY, 0);
+    pid_t nChild = 0;
+    const int nFault = posix_spawnp(&nChild, oArguments[0], &oActions, nullptr, oArguments.data(), environ);
+    posix_spawn_file_actions_destroy(&oActions);
+    int nStatus = 0;
+    if (nFault == 0)
+        waitpid(nChild, &nStatus, 0);
+    const bool bMissing = nFault == ENOENT || (WIFEXITED(nStatus) && WEXITSTATUS(nStatus) == 127);
+    if (!bMissing && (nFault != 0 || nStatus != 0))
+        throw std::runtime_error(oWords[0] + " " + oWords[1] + " failed");
+    return !bMissing;
+}
+
+struct Program
+{
+    std::string moName;
+    Words moWords;
+    std::string moTarget;
+};
+
+// The pixels of the programs' files are the same: one tile of each tells.
+void CheckSame(const std::vector<Program>& oPrograms)
+{
+    std::vector<unsigned char> oFirst;
+    for (const Program& oProgram : oPrograms)
+    {
+        const std::unique_ptr<TIFF, decltype(&TIFFClose)> oTiff(TIFFOpen(oProgram.moTarget.c_str(), "r"), &TIFFClose);
+        std::vector<unsigned char> oTile(static_cast<std::size_t>(TIFFTileSize(oTiff.get())));
+        if (TIFFReadEncodedTile(oTiff.get(), 1, oTile.data(), static_cast<tmsize_t>(oTile.size())) < 0 ||
+            (!oFirst.empty() && oTile != oFirst))
+            throw std::runtime_error(oProgram.moName + " made other pixels");
+        oFirst = oTile;
+    }
+}
+
+// The first program is krv.
+void Measure(const std::string& workload, std::vector<Program> oPrograms)
+{
+    std::erase_if(oPrograms, [](const Program& oProgram) { return !Run(oProgram.moWords); });
+    CheckSame(oPrograms);
+    std::vector<Candidate> oCandidates;
+    for (const Program& oProgram : oPrograms)
+        oCandidates.push_back({oProgram.moName, [oProgram]
+                               {
+                                   std::filesystem::remove(oProgram.moTarget);
+                                   Run(oProgram.moWords);
+                               }});
+    const auto oTimes = MedianSeconds(oCandidates, 5);
+    for (std::size_t n = 1; n < oPrograms.size(); ++n)
+        PrintRow(workload + ", against " + oPrograms[n].moName, oTimes[n] / oTimes[0], 1.0,
+                 Number(oTimes[0] * 1000, 0) + " and " + Number(oTimes[n] * 1000, 0) + " ms");
+    for (const Program& oProgram : oPrograms)
+        std::filesystem::remove(oProgram.moTarget);
+}
+
+} // namespace
+
+int main(int nArguments, char** pArguments)
+{
+    const Arguments oArguments(nArguments, pArguments, "FOLDER [--size N]");
+    const std::string& folder = oArguments.GetWords().front();
+    const unsigned int nSize = oArguments.GetNumber("size", 8192) / 512 * 512;
+    std::filesystem::create_directories(folder);
+    setenv("VIPS_CONCURRENCY", "1", 1);
+    TIFFSetWarningHandler(nullptr);
+    const std::string krv = (std::filesystem::read_symlink("/proc/self/exe").parent_path() / "krv").string();
+    const auto Target = [&](const std::string& name)
+    {
+        return folder + "/command." + name + ".tif";
+    };
+    const std::string k = Target("krv"), v = Target("vips"), t = Target("tiffcp");
+    PrintHeading("The command line on " + std::to_string(nSize) + " x " + std::to_string(nSize) + " x 3 of 8 bits");
+    const SceneKind oKind{"3x8U", 3, 8, false};
+    const std::string plain = MakeScene(folder, oKind, "none", 256, nSize).moPath;
+    const std::string zipped = MakeScene(folder, oKind, "deflate", 256, nSize).moPath;
+    const Words TILES = {"--tile", "--tile-width", "256", "--tile-height", "256"};
+    const auto Vips = [&](const std::string& source, const Words& oMore)
+    {
+        Words oWords = {"vips", "tiffsave", source, v};
+        oWords.insert(oWords.end(), TILES.begin(), TILES.end());
+        oWords.insert(oWords.end(), oMore.begin(), oMore.end());
+        return Program{"vips", oWords, v};
+    };
+    const auto Krv = [&](const std::string& source, const std::string& options)
+    {
+        return Program{"krv", {krv, "convert", source, k, "--options", "BLOCKXSIZE=256 BLOCKYSIZE=256 " + options}, k};
+    };
+    const auto Tiffcp = [&](const std::string& source, const std::string& codec)
+    {
+        return Program{"tiffcp", {"tiffcp", "-t", "-w", "256", "-l", "256", "-c", codec, source, t}, t};
+    };
+    Measure("none to none", {Krv(plain, "COMPRESS=NONE"), Vips(plain, {}), Tiffcp(plain, "none")});
+    Measure("deflate to none", {Krv(zipped, "COMPRESS=NONE"), Vips(zipped, {}), Tiffcp(zipped, "none")});
+    Measure("none to deflate",
+            {Krv(plain, "COMPRESS=DEFLATE PREDICTOR=2"),
+             Vips(plain, {"--compression", "deflate", "--predictor", "horizontal"}), Tiffcp(plain, "zip:2")});
+    Measure("none to a pyramid", {Krv(plain, "COMPRESS=NONE LAYOUT=COG"), Vips(plain, {"--pyramid", "--subifd"})});
+    return 0;
+}
