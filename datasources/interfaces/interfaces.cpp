@@ -15,6 +15,7 @@
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
+#include "datasources/interfaces/istoragedataset.h"
 
 namespace krv::datasources
 {
@@ -34,6 +35,7 @@ IOverviewManager::~IOverviewManager() = default;
 IPCTDataset::~IPCTDataset() = default;
 IRasterDataset::~IRasterDataset() = default;
 IRasterIO::~IRasterIO() = default;
+IStorageDataset::~IStorageDataset() = default;
 
 unsigned int FindValidityMask(const IBitmapDataset& oBitmaps)
 {

@@ -105,14 +105,14 @@ void Space::Reuse(const Roots& oHeld)
                   });
 }
 
-std::uint64_t Space::TrimEnd()
+std::uint64_t Space::CountUnused() const
 {
-    if (!moFree.empty() && std::prev(moFree.end())->first + std::prev(moFree.end())->second == mnEnd)
-    {
-        mnEnd = std::prev(moFree.end())->first;
-        RemoveFree(std::prev(moFree.end()));
-    }
-    return mnEnd;
+    std::uint64_t nBytes = 0;
+    for (const auto& [nOffset, nFree] : moFree)
+        nBytes += nFree;
+    for (const GivenUp& oPiece : moGivenUp)
+        nBytes += oPiece.moExtent.mnBytes;
+    return nBytes;
 }
 
 void Space::RemoveFree(std::map<std::uint64_t, std::uint64_t>::iterator oFree)

@@ -57,8 +57,8 @@ public:
     using Roots = std::optional<std::vector<std::uint64_t>>;
     void Reuse(const Roots& oHeld);
 
-    // Forgets the free piece that the file ends with, if there is one, and returns where the file ends.
-    std::uint64_t TrimEnd();
+    // Bytes that are free or were given up.
+    std::uint64_t CountUnused() const;
 
 private:
     struct GivenUp

@@ -636,6 +636,22 @@ void TifDataset::WriteBook(const krv::datasources::AuxiliaryData& oBook, PixelUs
     Refresh();
 }
 
+// A file whose further pages are damaged can be read, and nobody knows what of it is used.
+std::optional<std::uint64_t> TifDataset::GetUnusedBytes()
+{
+    CheckOpen();
+    if (mpoEditor)
+        return mpoEditor->GetUnusedBytes();
+    try
+    {
+        return FileEditor::CountUnusedBytes(mpoFile, GetPage().GetHeader());
+    }
+    catch (const krv::FileException&)
+    {
+        return std::nullopt;
+    }
+}
+
 void TifDataset::CreateLevel(unsigned int nLevel, PixelUse eUse, const Place& oPlace)
 {
     FileEditor& oEditor = GetEditor("overviews cannot be written", oPlace);

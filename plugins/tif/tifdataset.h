@@ -3,6 +3,7 @@
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/istoragedataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "plugins/support/dataset.h"
 #include "plugins/tif/page.h"
@@ -28,7 +29,8 @@ namespace krv::plugins::tif
 class TifDataset : public support::Dataset,
                    public krv::datasources::IGeocodedDataset,
                    public krv::datasources::IBitmapDataset,
-                   public krv::datasources::IPCTDataset
+                   public krv::datasources::IPCTDataset,
+                   public krv::datasources::IStorageDataset
 {
 public:
     // Throws krv::FileException kinds that name file and cause; nothing stays open then.
@@ -83,6 +85,8 @@ public:
     void SetPCTDescription(unsigned int nPCT, const std::string& oDescription) override;
     void DeletePCT(unsigned int nPCT) override;
 
+    std::optional<std::uint64_t> GetUnusedBytes() override;
+
     // For the overview managers: the levels of the image or of its mask, and the pixels of a page.
     const std::vector<PageLevel>& GetLevels(PixelUse eUse) const;
     // The number of the bitmap that the mask levels belong to; 0 when there is none.
@@ -121,7 +125,7 @@ private:
     void CheckPCT(unsigned int nPCT, const Place& oPlace) const;
 
     std::shared_ptr<FileEditor> mpoEditor; // null when the file is only read
-    std::shared_ptr<const support::File> mpoFile;
+    std::shared_ptr<support::File> mpoFile;
     mutable std::shared_ptr<Page> mpoPage;
     std::weak_ptr<PageWriter> mpoImageWriter;
     std::string moResampling;

@@ -61,7 +61,7 @@ TEST(Command, InfoKeepsItsFieldNames)
     ASSERT_EQ(oRun.code, 0) << oRun.errors;
     const json oInfo = oRun.Json();
     for (const char* pName : {"file", "format", "width", "height", "blockWidth", "blockHeight", "channels", "metadata",
-                              "geocoding", "crs", "overviews", "bitmaps", "mathModels"})
+                              "geocoding", "crs", "overviews", "bitmaps", "mathModels", "unusedBytes"})
         EXPECT_TRUE(oInfo.contains(pName)) << pName;
     EXPECT_EQ(oInfo["width"], 300);
     EXPECT_EQ(oInfo["blockWidth"], 256);
@@ -73,6 +73,14 @@ TEST(Command, InfoKeepsItsFieldNames)
     EXPECT_EQ(oInfo["channels"][2]["noData"], "0");
     EXPECT_EQ(oInfo["channels"][2]["description"], "Blue");
     EXPECT_EQ(oInfo["overviews"], json::array());
+    EXPECT_EQ(oInfo["unusedBytes"], nullptr) << "made elsewhere";
+    const TempFolder oFolder;
+    const std::string copy = oFolder.File("copy.tif");
+    ASSERT_EQ(RunKrv({"convert", SceneFolder() + "/rgb.tif", copy}).code, 0);
+    EXPECT_LT(RunKrv({"info", copy, "--json"}).Json()["unusedBytes"], 16384) << "the gap before the first block";
+    ASSERT_EQ(RunKrv({"overviews", copy, "--levels", "2"}).code, 0);
+    EXPECT_GT(RunKrv({"info", copy, "--json"}).Json()["unusedBytes"], 0);
+    EXPECT_NE(RunKrv({"info", copy}).output.find("\n  unused "), std::string::npos);
     const std::string text = RunKrv({"info", SceneFolder() + "/pan.tif"}).output;
     EXPECT_NE(text.find("EPSG:32719"), std::string::npos) << text;
     EXPECT_NE(text.find("16U"), std::string::npos) << text;

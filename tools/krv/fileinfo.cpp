@@ -8,6 +8,7 @@
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/istoragedataset.h"
 #include "datasources/metadata/displaydefaults.h"
 #include "datasources/metadata/referencetag.h"
 #include "datasources/reader/ioverviewaccessor.h"
@@ -18,6 +19,7 @@
 #include "tools/krv/sourcefile.h"
 
 #include <memory>
+#include <optional>
 
 namespace krv::tool
 {
@@ -147,6 +149,13 @@ Json MathModelsToJson(const SourceFile& oFile)
     return poModels != nullptr ? Json(poModels->GetMathModelList()) : Json::array();
 }
 
+Json UnusedToJson(const SourceFile& oFile)
+{
+    auto* const poStorage = dynamic_cast<IStorageDataset*>(&oFile.GetDataset());
+    const std::optional<std::uint64_t> oBytes = poStorage != nullptr ? poStorage->GetUnusedBytes() : std::nullopt;
+    return oBytes ? Json(*oBytes) : Json(nullptr);
+}
+
 Json DisplayToJson(const SourceFile& oFile)
 {
     const AuxiliaryData& oMetadata = oFile.GetMetadata();
@@ -188,6 +197,7 @@ Json GatherInfo(const SourceFile& oFile)
     oJson["mathModels"] = MathModelsToJson(oFile);
     oJson["colourTables"] = TablesToJson(oFile);
     oJson["displayDefaults"] = DisplayToJson(oFile);
+    oJson["unusedBytes"] = UnusedToJson(oFile);
     return oJson;
 }
 

@@ -128,6 +128,8 @@ std::string InfoText(const Json& oInfo)
     if (!oInfo["mathModels"].empty())
         text += Line("math models", oInfo["mathModels"].dump());
     text += DisplayText(oInfo["displayDefaults"]);
+    if (!oInfo["unusedBytes"].is_null() && oInfo["unusedBytes"] != 0)
+        text += Line("unused", fmt::format("{} bytes of the file", Text(oInfo["unusedBytes"])));
     text += "  channels\n";
     for (const Json& oChannel : oInfo["channels"])
         text += ChannelText(oChannel);

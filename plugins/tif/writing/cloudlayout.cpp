@@ -1,6 +1,7 @@
 #include "plugins/tif/writing/cloudlayout.h"
 
 #include "plugins/tif/writing/directorybytes.h"
+#include "plugins/tif/writing/roomrecord.h"
 
 #include <algorithm>
 #include <cstdint>
@@ -40,11 +41,11 @@ std::vector<Placed> Sort(const std::vector<std::shared_ptr<PageModel>>& oPages)
     return oSorted;
 }
 
-void PlaceDirectory(Placed& oPlaced, const FileHeader& oHeader, support::Space& oSpace)
+void PlaceDirectory(Placed& oPlaced, const FileHeader& oHeader, std::uint64_t nBehind, support::Space& oSpace)
 {
     const std::size_t nWord = oHeader.mbBigTiff ? 8 : 4;
     PageModel& oPage = oPlaced.moPage;
-    oPage.moDirectory = oSpace.Allocate(GetDirectoryBytes(oPage, oHeader));
+    oPage.moDirectory = oSpace.Allocate(GetDirectoryBytes(oPage, oHeader) + nBehind);
     for (Tag& oTag : oPage.moTags.GetTags())
         if (oTag.GetBytes() > nWord)
             oTag.moStored = oSpace.Allocate(oTag.GetBytes());
@@ -100,12 +101,18 @@ void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, con
     support::Space oSpace(oTarget.GetName(), oHeader.GetBytes(), oHeader.mbBigTiff ? INT64_MAX : UINT32_MAX,
                           "the file would pass the limit of 4 GiB of classic TIFF");
     for (Placed& oPlaced : oSorted)
-        PlaceDirectory(oPlaced, oHeader, oSpace);
+        PlaceDirectory(oPlaced, oHeader, &oPlaced == oSorted.data() ? RoomRecord::GetBytes(0) : 0, oSpace);
     for (auto oPlaced = oSorted.rbegin(); oPlaced != oSorted.rend(); ++oPlaced)
         CopyBlocks(*oPlaced, oSource, oSpace, oTarget);
     for (std::size_t nAt = 0; nAt < oSorted.size(); ++nAt)
         WriteDirectory(oSorted[nAt], oHeader,
                        nAt + 1 < oSorted.size() ? oSorted[nAt + 1].moPage.moDirectory.mnOffset : 0, oTarget);
+    // All of the file was written here.
+    const Extent& oRoot = oSorted.front().moPage.moDirectory;
+    const std::uint64_t nRecord = oRoot.mnOffset + GetDirectoryBytes(oSorted.front().moPage, oHeader);
+    RoomRecord oRecord;
+    oRecord.mnFileBytes = std::max(oTarget.GetSize(), nRecord + oRecord.GetBytes());
+    oTarget.Write(nRecord, oRecord.Make(oRoot.mnOffset).data(), oRecord.GetBytes());
     unsigned char aHeader[FileHeader::BYTES] = {};
     oHeader.Write(aHeader, oSorted.front().moPage.moDirectory.mnOffset);
     oTarget.Write(0, aHeader, oHeader.GetBytes());

@@ -15,10 +15,15 @@ std::size_t WordBytes(const FileHeader& oHeader)
 
 } // namespace
 
-std::uint64_t GetDirectoryBytes(const PageModel& oPage, const FileHeader& oHeader)
+std::uint64_t GetDirectoryBytes(std::size_t nEntries, const FileHeader& oHeader)
 {
     const std::size_t nWord = WordBytes(oHeader);
-    return (oHeader.mbBigTiff ? 8 : 2) + (oPage.moTags.GetTags().size() + 2) * (4 + 2 * nWord) + nWord;
+    return (oHeader.mbBigTiff ? 8 : 2) + nEntries * (4 + 2 * nWord) + nWord;
+}
+
+std::uint64_t GetDirectoryBytes(const PageModel& oPage, const FileHeader& oHeader)
+{
+    return GetDirectoryBytes(oPage.moTags.GetTags().size() + 2, oHeader);
 }
 
 std::vector<unsigned char> MakeDirectory(const PageModel& oPage, const FileHeader& oHeader, std::uint64_t nOffsetArray,

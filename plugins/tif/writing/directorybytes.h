@@ -9,7 +9,8 @@
 namespace krv::plugins::tif
 {
 
-// Bytes of the directory of a page, without the values that lie elsewhere.
+// Bytes of a directory of so many entries, and of that of a page, without the values that lie elsewhere.
+std::uint64_t GetDirectoryBytes(std::size_t nEntries, const FileHeader& oHeader);
 std::uint64_t GetDirectoryBytes(const PageModel& oPage, const FileHeader& oHeader);
 
 // The directory of a page as it stands in the file. Tags that do not fit their entries have their places already; so

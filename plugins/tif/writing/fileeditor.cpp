@@ -40,6 +40,11 @@ bool IsCounts(std::uint16_t nTag)
     return nTag == TIFFTAG_STRIPBYTECOUNTS || nTag == TIFFTAG_TILEBYTECOUNTS;
 }
 
+std::uint64_t GetEnd(const Extent& oPiece)
+{
+    return oPiece.mnOffset + oPiece.mnBytes;
+}
+
 FileHeader ReadHeader(const support::File& oFile)
 {
     unsigned char aHeader[FileHeader::BYTES] = {};
@@ -63,14 +68,19 @@ struct FileEditor::Written
 };
 
 FileEditor::FileEditor(const std::string& fileName)
-    : moFileName(fileName), mpoFile(std::make_shared<support::File>(fileName, support::File::Mode::eUpdate)),
-      moHeader(ReadHeader(*mpoFile))
+    : FileEditor(std::make_shared<support::File>(fileName, support::File::Mode::eUpdate), std::nullopt)
+{
+    mpoSpace->Reuse(mpoFile->FindHeld());
+}
+
+FileEditor::FileEditor(std::shared_ptr<support::File> poFile, const std::optional<FileHeader>& oHeader)
+    : moFileName(poFile->GetName()), mpoFile(std::move(poFile)), moHeader(oHeader ? *oHeader : ReadHeader(*mpoFile))
 {
     UseSpace(mpoFile->GetSize());
-    mpoSpace->Keep(0, mpoFile->GetSize());
     mpoSpace->Age(moHeader.mnFirstDirectory);
     mnCommittedSize = mpoFile->GetSize();
     ReadPages();
+    FindUnused();
 }
 
 FileEditor::FileEditor(const std::string& fileName, const CreateOptions& oOptions)
@@ -175,9 +185,7 @@ void FileEditor::ReadPage(std::uint64_t nOffset, bool bBelowFirst, std::uint64_t
     std::stable_sort(poPage->moTags.GetTags().begin(), poPage->moTags.GetTags().end(),
                      [](const Tag& oFirst, const Tag& oSecond) { return oFirst.mnTag < oSecond.mnTag; });
     ReadStriles(*poPage, oDirectory);
-    const std::size_t nEntryBytes = 4 + 2 * nWord;
-    poPage->moDirectory = {nOffset, (moHeader.mbBigTiff ? 8 : 2) + oDirectory.GetEntries().size() * nEntryBytes + nWord,
-                           0};
+    poPage->moDirectory = {nOffset, GetDirectoryBytes(oDirectory.GetEntries().size(), moHeader), 0};
     poPage->mnNext = oDirectory.GetNext();
     poPage->mbBelowFirst = bBelowFirst;
     poPage->mnNumber = mnNextNumber++;
@@ -251,6 +259,98 @@ void FileEditor::LoadTags(PageModel& oPage)
 {
     for (Tag& oTag : oPage.moTags.GetTags())
         Load(oTag);
+}
+
+std::vector<Extent> FileEditor::ListUsed() const
+{
+    std::vector<Extent> oUsed = {{0, moHeader.GetBytes(), 0}};
+    const auto Add = [&oUsed](const Extent& oPiece)
+    {
+        if (oPiece.mnBytes != 0)
+            oUsed.push_back(oPiece);
+    };
+    for (const std::shared_ptr<PageModel>& poPage : moPages)
+    {
+        for (const Extent& oPiece : {poPage->moDirectory, poPage->moOffsetArray, poPage->moCountArray})
+            Add(oPiece);
+        for (const Tag& oTag : poPage->moTags.GetTags())
+            Add(oTag.moStored);
+        for (std::size_t nAt = 0; nAt < poPage->GetStriles(); ++nAt)
+            Add({poPage->moOffsets[nAt], poPage->moRoom[nAt], 0});
+    }
+    std::sort(oUsed.begin(), oUsed.end(),
+              [](const Extent& oFirst, const Extent& oSecond) { return oFirst.mnOffset < oSecond.mnOffset; });
+    return oUsed;
+}
+
+// Whether two of the pieces, which ascend, have bytes in common that this library wrote. It never does that: somebody
+// else was here.
+bool FileEditor::SharesOwn(const std::vector<Extent>& oPieces) const
+{
+    const std::vector<Extent>& oForeign = moRecord.moForeign;
+    std::uint64_t nEnd = 0;
+    for (const Extent& oPiece : oPieces)
+    {
+        if (oPiece.mnOffset < nEnd &&
+            std::none_of(oForeign.begin(), oForeign.end(),
+                         [&](const Extent& oPart)
+                         { return oPart.mnOffset <= oPiece.mnOffset && nEnd <= GetEnd(oPart); }))
+            return true;
+        nEnd = std::max(nEnd, GetEnd(oPiece));
+    }
+    return false;
+}
+
+void FileEditor::FindUnused()
+{
+    Extent& oRoot = moPages.front()->moDirectory;
+    const std::uint64_t nSize = mpoFile->GetSize();
+    const std::optional<RoomRecord> oRecord = RoomRecord::Read(*mpoFile, oRoot.mnOffset, GetEnd(oRoot));
+    moRecord = oRecord.value_or(RoomRecord());
+    if (oRecord)
+        oRoot.mnBytes += oRecord->GetBytes();
+    // What lies behind the end that is recorded was added by somebody else, or by a writer that was killed.
+    moRecord.AddForeign(moRecord.mnFileBytes, nSize - moRecord.mnFileBytes);
+    std::vector<Extent> oTaken = ListUsed();
+    if (SharesOwn(oTaken))
+    {
+        moRecord = RoomRecord();
+        moRecord.AddForeign(0, nSize);
+    }
+    oTaken.insert(oTaken.end(), moRecord.moForeign.begin(), moRecord.moForeign.end());
+    oTaken.push_back({nSize, 0, 0});
+    std::sort(oTaken.begin(), oTaken.end(),
+              [](const Extent& oFirst, const Extent& oSecond) { return oFirst.mnOffset < oSecond.mnOffset; });
+    std::vector<Extent> oUnused;
+    std::uint64_t nEnd = 0;
+    for (const Extent& oPiece : oTaken)
+    {
+        if (oPiece.mnOffset > nEnd)
+            oUnused.push_back({nEnd, oPiece.mnOffset - nEnd, 0});
+        nEnd = std::max(nEnd, GetEnd(oPiece) + GetEnd(oPiece) % 2);
+    }
+    for (const Extent& oPiece : oUnused)
+        mpoSpace->AddUnused(oPiece.mnOffset, oPiece.mnBytes);
+    for (const Extent& oPart : moRecord.moForeign)
+        mpoSpace->Keep(oPart.mnOffset, oPart.mnBytes);
+}
+
+std::optional<std::uint64_t> FileEditor::GetUnusedBytes() const
+{
+    const bool bForeign = moRecord.moForeign.size() == 1 && moRecord.moForeign.front().mnOffset == 0 &&
+                          moRecord.moForeign.front().mnBytes >= mnCommittedSize;
+    return bForeign ? std::nullopt : std::optional(mpoSpace->CountUnused());
+}
+
+std::optional<std::uint64_t> FileEditor::CountUnusedBytes(std::shared_ptr<support::File> poFile,
+                                                          const FileHeader& oHeader)
+{
+    PeekReader oReader(*poFile);
+    const RawDirectory oRoot(oReader, oHeader, oHeader.mnFirstDirectory);
+    const std::uint64_t nEnd = oRoot.GetOffset() + GetDirectoryBytes(oRoot.GetEntries().size(), oHeader);
+    if (!RoomRecord::Read(*poFile, oRoot.GetOffset(), nEnd))
+        return std::nullopt;
+    return FileEditor(std::move(poFile), oHeader).GetUnusedBytes();
 }
 
 void FileEditor::CreateFile(bool bBigTiff, bool bGap)
@@ -460,10 +560,16 @@ FileEditor::Written FileEditor::WriteDirectory(PageModel& oPage, std::uint64_t n
 
     // A directory that is only written ahead names no arrays: whoever reads by it knows the places.
     const std::uint64_t nNone = moHeader.GetBytes();
-    const std::vector<unsigned char> oBytes =
-        MakeDirectory(oPage, moHeader, bDraft ? nNone : oWritten.moOffsetArray.mnOffset,
-                      bDraft ? nNone : oWritten.moCountArray.mnOffset, nNext);
-    oWritten.moDirectory = mpoSpace->Allocate(oBytes.size());
+    std::vector<unsigned char> oBytes = MakeDirectory(oPage, moHeader, bDraft ? nNone : oWritten.moOffsetArray.mnOffset,
+                                                      bDraft ? nNone : oWritten.moCountArray.mnOffset, nNext);
+    const bool bRoot = !bDraft && &oPage == moPages.front().get();
+    oWritten.moDirectory = mpoSpace->Allocate(oBytes.size() + (bRoot ? moRecord.GetBytes() : 0));
+    if (bRoot)
+    {
+        moRecord.mnFileBytes = std::max(mpoFile->GetSize(), GetEnd(oWritten.moDirectory));
+        const std::vector<unsigned char> oRecord = moRecord.Make(oWritten.moDirectory.mnOffset);
+        oBytes.insert(oBytes.end(), oRecord.begin(), oRecord.end());
+    }
     mpoFile->Write(oWritten.moDirectory.mnOffset, oBytes.data(), oBytes.size());
     return oWritten;
 }

@@ -4,9 +4,11 @@
 #include "plugins/support/space.h"
 #include "plugins/tif/page.h"
 #include "plugins/tif/writing/pagemodel.h"
+#include "plugins/tif/writing/roomrecord.h"
 
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -27,6 +29,9 @@ public:
     explicit FileEditor(const std::string& fileName);
     // For a new file, which is made by AddFirstPage.
     FileEditor(const std::string& fileName, const CreateOptions& oOptions);
+    // Bytes that the state of a file which a header names leaves unused; no value when other programs may use them.
+    static std::optional<std::uint64_t> CountUnusedBytes(std::shared_ptr<support::File> poFile,
+                                                         const FileHeader& oHeader);
     ~FileEditor();
     FileEditor(const FileEditor&) = delete;
     FileEditor& operator=(const FileEditor&) = delete;
@@ -68,6 +73,9 @@ public:
     // Stores what the writers hold back.
     void StoreHeld();
 
+    // Bytes of the file that nothing uses; no value when other programs may.
+    std::optional<std::uint64_t> GetUnusedBytes() const;
+
     // Whether anything changed since the last Synchronize; blocks that are held back do not count.
     bool IsChanged() const;
     void Synchronize();
@@ -83,7 +91,13 @@ public:
 private:
     struct Written;
 
+    // Over a file that is open already; one that is open for reading only is looked at.
+    FileEditor(std::shared_ptr<support::File> poFile, const std::optional<FileHeader>& oHeader);
     void ReadPages();
+    // What nothing in the file names is unused where this library alone wrote.
+    void FindUnused();
+    std::vector<Extent> ListUsed() const;
+    bool SharesOwn(const std::vector<Extent>& oPieces) const;
     void ReadPage(std::uint64_t nOffset, bool bBelowFirst, std::uint64_t& nNext);
     void ReadStriles(PageModel& oPage, const RawDirectory& oDirectory);
     std::vector<std::uint64_t> ReadArray(const DirectoryEntry& oEntry);
@@ -112,6 +126,7 @@ private:
     std::uint64_t mnNextNumber = 1;
     std::uint64_t mnCommittedSize = 0; // of the file with all that its committed state may use
     std::vector<Extent> moReleased;    // of pages that are gone
+    RoomRecord moRecord;               // that goes with the next state
     bool mbChanged = false;            // pages came or went
     bool mbEnded = false;
     bool mbNamed = true;

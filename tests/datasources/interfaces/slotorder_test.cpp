@@ -13,6 +13,7 @@
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
+#include "datasources/interfaces/istoragedataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/reader/irasteriterable.h"
@@ -110,6 +111,7 @@ std::vector<Table> Tables()
         {"IPCTDataset",
          {Slot(&PC::GetPCTList), Slot(&PC::GetPCT), Slot(&PC::GetPCTChannel), Slot(&PC::GetPCTDescription),
           Slot(&PC::CreatePCT), Slot(&PC::UpdatePCT), Slot(&PC::SetPCTDescription), Slot(&PC::DeletePCT)}},
+        {"IStorageDataset", {Slot(&IStorageDataset::GetUnusedBytes)}},
         {"IHistoryIO",
          {Slot(&IHistoryIO::ReadHistory), Slot(&IHistoryIO::AppendHistory), Slot(&IHistoryIO::ClearHistory)}},
         {"IMathModelDataset",

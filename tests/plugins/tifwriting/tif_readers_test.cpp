@@ -1,4 +1,8 @@
+// A writer and readers of one file at a time, in one process and in several, and which room it uses again.
+
+#include "datasources/metadata/auxiliarydata.h"
 #include "tests/plugins/tif/tifsupport.h"
+#include "tests/support/tiffwriter.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <cstddef>
@@ -20,6 +24,7 @@ namespace
 {
 
 using namespace krv::test;
+using krv::datasources::AuxiliaryData;
 
 constexpr const char* KINDS[] = {"BLOCKXSIZE=32 BLOCKYSIZE=32", "COMPRESS=LZW TILED=NO BLOCKYSIZE=9 INTERLEAVE=BAND",
                                  "COMPRESS=ZSTD BLOCKXSIZE=64 BLOCKYSIZE=64 BIGTIFF=YES"};
@@ -184,6 +189,102 @@ TEST(TifReaders, ReadersInOtherProcessesSeeOneStateEach)
         const std::uintmax_t nBytes = Write(2);
         EXPECT_EQ(Write(20), nBytes) << "room that nobody reads is not used again";
     }
+}
+
+// Writes other pixels over all of a file, opened anew, and returns its size.
+std::uintmax_t Rewrite(const std::string& fileName, unsigned int nSeed)
+{
+    const TifPointer poWriter = OpenTif(fileName, eUpdate);
+    const Bytes oPixels = MakePixels(poWriter->GetWidth(), poWriter->GetHeight(), 1, krv::gobs::eDT_8U, nSeed);
+    WriteAll(*poWriter, oPixels);
+    AuxiliaryData oData = poWriter->ReadAuxiliaryData();
+    oData.SetFileMetadataValue("Turn", std::string(nSeed * 10, 'x'));
+    poWriter->WriteAuxiliaryData(oData);
+    poWriter->Close();
+    EXPECT_EQ(Judge(fileName).moComplaints, "");
+    EXPECT_TRUE(Judge(fileName).moPixels == oPixels);
+    return std::filesystem::file_size(fileName);
+}
+
+std::optional<std::uint64_t> Unused(const std::string& fileName)
+{
+    return OpenTif(fileName)->GetUnusedBytes();
+}
+
+TEST(TifRoom, WhatEarlierOpeningsGaveUpIsUsedAgain)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("g.tif");
+    for (const std::string kind : {"", "COMPRESS=LZW", "LAYOUT=COG COMPRESS=ZSTD BIGTIFF=YES"})
+    {
+        SCOPED_TRACE(kind);
+        CreateTif(fileName, "BLOCKXSIZE=32 BLOCKYSIZE=32 " + kind, 300, 200, 1, krv::gobs::eDT_8U)->Close();
+        EXPECT_EQ(Unused(fileName).value_or(99) / 20000, 0u);
+        Rewrite(fileName, 1);
+        const std::uintmax_t nOnce = std::filesystem::file_size(fileName);
+        for (unsigned int nSeed = 2; nSeed < 9; ++nSeed)
+            EXPECT_LT(Rewrite(fileName, nSeed), 2 * nOnce + 30000) << nSeed;
+        EXPECT_GT(Unused(fileName).value_or(0), nOnce / 2);
+        EXPECT_LT(Unused(fileName).value_or(0), 2 * nOnce);
+        // A reader keeps what it reads from one opening of the writer to the next.
+        const TifPointer poReader = OpenTif(fileName);
+        const Bytes oPixels = Judge(fileName).moPixels;
+        for (unsigned int nSeed = 9; nSeed < 13; ++nSeed)
+            Rewrite(fileName, nSeed);
+        EXPECT_TRUE(ReadAll(*poReader) == oPixels);
+        std::filesystem::remove(fileName);
+    }
+}
+
+// Bytes that no tag known here names may be somebody's: where others wrote, nothing is ever overwritten, whether they
+// made the file, added to it, or changed what this library had made.
+TEST(TifRoom, WhatOthersWroteIsNeverOverwritten)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("o.tif");
+    const auto KeepsAll = [&](const char* pHow)
+    {
+        SCOPED_TRACE(pHow);
+        const std::string bytes = ReadFile(fileName);
+        std::uintmax_t nFirst = 0;
+        for (unsigned int nSeed = 1; nSeed < 6; ++nSeed)
+        {
+            const std::uintmax_t nBytes = Rewrite(fileName, nSeed);
+            nFirst = nSeed == 2 ? nBytes : nFirst;
+            EXPECT_TRUE(nSeed < 3 || nBytes < nFirst + 2000) << nBytes << " after " << nFirst;
+        }
+        // All but the place of the first directory.
+        EXPECT_TRUE(ReadFile(fileName).substr(8, bytes.size() - 8) == bytes.substr(8));
+    };
+    const auto Append = [&](std::size_t nBytes)
+    {
+        oFolder.Write("o.tif", ReadFile(fileName) + std::string(nBytes, 'f'));
+    };
+    {
+        const TiffFile poFile = NewTiff(fileName);
+        SetForm(poFile.get(), {.mnWidth = 300, .mnHeight = 200, .mnTileWidth = 32});
+        WriteBlocks(poFile.get());
+    }
+    EXPECT_EQ(Unused(fileName), std::nullopt);
+    Append(5001);
+    KeepsAll("made elsewhere");
+
+    CreateTif(fileName, "BLOCKXSIZE=32 BLOCKYSIZE=32", 300, 200, 1, krv::gobs::eDT_8U)->Close();
+    for (unsigned int nSeed = 1; nSeed < 4; ++nSeed)
+        Rewrite(fileName, nSeed);
+    const std::string before = ReadFile(fileName);
+    Append(7001);
+    Rewrite(fileName, 4);
+    Rewrite(fileName, 5);
+    EXPECT_EQ(ReadFile(fileName).substr(before.size(), 7001), std::string(7001, 'f'));
+    EXPECT_LT(std::filesystem::file_size(fileName), before.size() + 7001 + 2000) << "the rest is used again";
+
+    {
+        const TiffFile poChanged = NewTiff(fileName, "r+");
+        TIFFSetField(poChanged.get(), TIFFTAG_SOFTWARE, "another program");
+    }
+    EXPECT_EQ(Unused(fileName), std::nullopt);
+    KeepsAll("changed elsewhere");
 }
 
 } // namespace

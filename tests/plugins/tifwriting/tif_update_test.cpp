@@ -220,14 +220,17 @@ TEST(TifUpdate, AKilledWriterLeavesTheLastSynchronisedState)
     for (const WayOfWriting& oWay : WAYS)
     {
         int nChanged = 0;
+        const TempFolder oFolder;
+        const std::string fileName = oFolder.File("k.tif");
         for (int nRun = 0; nRun < KillRuns(); ++nRun)
         {
-            const TempFolder oFolder;
-            const std::string fileName = oFolder.File("k.tif");
-            const char* const pKind = KINDS[nRun / 2 % 4];
+            const char* const pKind = KINDS[nRun / 4 % 4];
             SCOPED_TRACE(std::string(oWay.mpName) + ", run " + std::to_string(nRun) + " " + pKind);
-            const bool bNew = nRun % 2 == 1;
-            if (!bNew)
+            // Killed while it is made, then again and again while it is updated.
+            const bool bNew = nRun % 4 == 0;
+            if (bNew)
+                std::filesystem::remove(fileName);
+            else if (!std::filesystem::exists(fileName))
                 CreateTif(fileName, pKind, 300, 200, 1, krv::gobs::eDT_8U)->Close();
             Kill(oRandom, nRun + 1 == KillRuns(),
                  [&](auto oTell)

@@ -1,0 +1,36 @@
+#pragma once
+
+#include "plugins/support/file.h"
+#include "plugins/support/space.h"
+
+#include <cstdint>
+#include <optional>
+#include <vector>
+
+namespace krv::plugins::tif
+{
+
+// What this library knows of a file that it wrote, kept behind the first directory, where no other reader looks: which
+// parts others wrote, who may rely on bytes that no tag known here names. In all of the rest, what nothing in the file
+// names is unused. The record belongs to one state: it names the place of its directory and the size of the file.
+// Whoever rewrites the file leaves no record that says the truth of itself, and all bytes are somebody else's again.
+struct RoomRecord
+{
+    std::uint64_t mnFileBytes = 0;
+    std::vector<support::Extent> moForeign; // ascending, apart from each other
+
+    // More parts than this become one.
+    static constexpr std::size_t MAXIMUM_FOREIGN = 64;
+
+    static std::size_t GetBytes(std::size_t nForeign);
+    // The bytes that go behind the directory at nDirectory.
+    std::vector<unsigned char> Make(std::uint64_t nDirectory) const;
+    // nEnd: where the directory ends. No value when there is no record, or one of another state.
+    static std::optional<RoomRecord> Read(const support::File& oFile, std::uint64_t nDirectory, std::uint64_t nEnd);
+
+    std::size_t GetBytes() const { return GetBytes(moForeign.size()); }
+    // Adds a part behind all others.
+    void AddForeign(std::uint64_t nOffset, std::uint64_t nBytes);
+};
+
+} // namespace krv::plugins::tif
