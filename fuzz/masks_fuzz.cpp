@@ -272,8 +272,9 @@ SampleValue ChooseValue(Choices& oChoices, const krv::test::Type& oType)
 
 void TryValues(Choices& oChoices)
 {
-    const auto eType = static_cast<NativeDataTypeCode>(oChoices.Below(15));
-    const krv::test::Type oType(eType);
+    // One-bit pixels are chosen as bytes of 0 and 1, and packed in the end.
+    const auto eType = static_cast<NativeDataTypeCode>(oChoices.Below(16));
+    const krv::test::Type oType(eType == eDT_BIT ? eDT_8U : eType);
     const unsigned int nChannels = oChoices.OneIn(8) ? 1 + oChoices.Below(40) : 1 + oChoices.Below(5);
     const std::size_t nPixels = oChoices.OneIn(4) ? oChoices.Below(400) : oChoices.Below(70);
     const BkgdRule eRule = oChoices.OneIn(2) ? eAnyChannel : eAllChannels;
@@ -300,11 +301,16 @@ void TryValues(Choices& oChoices)
             std::memcpy(&oPixels[i], &oBoundary[oRandom() % (oBoundary.size() / nPart) * nPart], nPart);
         else
             oType.mpoPart->Store(&oPixels[i], oRandom() % 3);
+        if (eType == eDT_BIT)
+            oPixels[i] &= 1;
     }
+    std::unique_ptr<unsigned char[]> oPacked(new unsigned char[(nPixels * nChannels + 7) / 8]());
+    for (std::size_t i = 0; eType == eDT_BIT && i < nPixels * nChannels; ++i)
+        oPacked[i / 8] |= oPixels[i] != 0 ? 128 >> i % 8 : 0;
     const ExactMaskDecision oDecision(eRule, oValues, oChannels, bNaN);
     const std::unique_ptr<IMaskDecisionImpl> oImpl(oDecision.GetImpl(eType, nChannels));
     std::unique_ptr<unsigned char[]> oBits(new unsigned char[(nPixels + 7) / 8]);
-    oImpl->Mark(oPixels.get(), nPixels, nChannels, oBits.get());
+    oImpl->Mark(eType == eDT_BIT ? oPacked.get() : oPixels.get(), nPixels, nChannels, oBits.get());
     for (std::size_t n = 0; n < (nPixels + 7) / 8 * 8; ++n)
     {
         unsigned int nListed = 0, nEqual = 0;

@@ -33,6 +33,8 @@ using krv::fuzz::Choices;
 using ReaderPtr = std::unique_ptr<IRasterReader>;
 using Channels = std::vector<unsigned int>;
 
+constexpr int NO_DATA = 7; // every type holds it
+
 NativeDataTypeCode ChooseType(Choices& oChoices)
 {
     return static_cast<NativeDataTypeCode>(oChoices.Below(15));
@@ -99,6 +101,9 @@ public:
                 if (oChoices.OneIn(2) && (nKind == 0 || std::min(moModel->mnWidth, moModel->mnHeight) >= 8))
                     moModel->moLevels.push_back(nLevel);
         moModel->moAuxiliary = AuxiliaryData(static_cast<unsigned int>(moModel->moTypes.size()));
+        mbNoData = nKind == 0 && oChoices.OneIn(2);
+        if (mbNoData)
+            moModel->moAuxiliary.SetFileMetadataValue("NO_DATA_VALUE", std::to_string(NO_DATA));
         if (nKind == 0)
             mpoDataset = std::make_unique<krv::test::SyntheticDataset>(moModel);
         else
@@ -115,6 +120,7 @@ public:
     IDataset* GetDataset() const { return mpoDataset.get(); }
     unsigned int GetChannelCount() const { return static_cast<unsigned int>(moModel->moTypes.size()); }
     const DataType& TypeOf(unsigned int nChannel) const { return moModel->moTypes.at(nChannel - 1); }
+    bool HasNoData() const { return mbNoData; }
     const Channels& GetLevels() const { return moModel->moLevels; }
 
     // The channels in a type, on a level (1: the image itself); 0 for a channel is zeros.
@@ -176,6 +182,7 @@ private:
     krv::test::ImageModelPtr moModel = std::make_shared<krv::test::ImageModel>();
     std::unique_ptr<krv::fuzz::InputFile> mpoFile;
     std::unique_ptr<IDataset> mpoDataset;
+    bool mbNoData = false;
 };
 
 // Where a reader of several types puts its channels: the channel at each position, 0 for none.
@@ -200,7 +207,8 @@ struct Known
     ReaderPtr mpoReader;
     ReferenceImage moImage;
     bool mbExact = false;
-    std::string moOutside; // a pixel of eConstant
+    std::string moConstant; // a pixel of eConstant
+    std::string moNoData;   // one of eNoData, "" without the value
 
     // The buffer for a window with margins, or "" where the reader refuses.
     std::string Expect(const Raster& oRaster, eMarginBehaviour eBehaviour) const
@@ -215,13 +223,15 @@ struct Known
         if (mbExact)
         {
             std::string bytes;
-            for (long long nRow = 0; nRow < nHeight && (!bOutside || eBehaviour != eException); ++nRow)
+            const bool bMissing = eBehaviour == eException || (eBehaviour == eNoData && moNoData.empty());
+            for (long long nRow = 0; nRow < nHeight && !(bOutside && bMissing); ++nRow)
                 for (long long nColumn = 0; nColumn < nWidth; ++nColumn)
                 {
                     const long long nFromX =
                         krv::conformance::FoldNaively(nLeft + nColumn, moImage.mnWidth, eBehaviour);
                     const long long nFromY = krv::conformance::FoldNaively(nTop + nRow, moImage.mnHeight, eBehaviour);
-                    bytes += nFromX < 0 || nFromY < 0 ? moOutside : moImage.Pixel(nFromX, nFromY);
+                    bytes += nFromX < 0 || nFromY < 0 ? (eBehaviour == eNoData ? moNoData : moConstant)
+                                                      : moImage.Pixel(nFromX, nFromY);
                 }
             return bytes;
         }
@@ -296,7 +306,10 @@ Known MakeReader(const Scene& oScene, Choices& oChoices)
         unsigned char oValue[16] = {};
         oConstant.push_back(oChoices.Between(-300, 300));
         oModel.mpoPart->Store(oValue, krv::test::ModelPart(oConstant.back(), *oModel.mpoPart));
-        oKnown.moOutside.append(reinterpret_cast<const char*>(oValue), oModel.Bytes());
+        oKnown.moConstant.append(reinterpret_cast<const char*>(oValue), oModel.Bytes());
+        oModel.mpoPart->Store(oValue, NO_DATA);
+        if (oScene.HasNoData())
+            oKnown.moNoData.append(reinterpret_cast<const char*>(oValue), oModel.Bytes());
     }
     oExact->SetConstant(oConstant);
     oKnown.mpoReader = std::move(oExact);
@@ -327,15 +340,20 @@ std::string DescribeRaster(const Raster& oRaster, eMarginBehaviour eBehaviour)
     return text;
 }
 
+eMarginBehaviour ChooseBehaviour(Choices& oChoices, const Known& oKnown)
+{
+    constexpr eMarginBehaviour BEHAVIOURS[] = {eReplicate, eMirror, eMirror101, eConstant, eWrap, eException, eNoData};
+    return BEHAVIOURS[oChoices.Below(oKnown.mbExact ? 7 : 6)];
+}
+
 void CheckTiles(const Known& oKnown, Choices& oChoices)
 {
-    constexpr eMarginBehaviour BEHAVIOURS[] = {eReplicate, eMirror, eMirror101, eConstant, eWrap, eException};
     IRasterReader& oReader = *oKnown.mpoReader;
     if (oChoices.OneIn(4))
         oReader.SetOptimalTileSize();
     else
         oReader.SetTileSize(oChoices.Below(oReader.GetWidth() + 9), oChoices.Below(oReader.GetHeight() + 9));
-    const eMarginBehaviour eBehaviour = oChoices.Of(BEHAVIOURS);
+    const eMarginBehaviour eBehaviour = ChooseBehaviour(oChoices, oKnown);
     const unsigned int nXMargin = oChoices.Below(2) * oChoices.Below(oReader.GetWidth() + 3);
     const unsigned int nYMargin = oChoices.Below(2) * oChoices.Below(oReader.GetHeight() + 3);
     const bool bWide = nXMargin > oReader.GetWidth() / 2 || nYMargin > oReader.GetHeight() / 2;
@@ -351,7 +369,7 @@ void CheckTiles(const Known& oKnown, Choices& oChoices)
         const bool bRead = Reads([&] { oRaster.reset(*oTile); });
         if (!bRead)
         {
-            Check(eBehaviour == eException, "a tile is refused");
+            Check(eBehaviour == eException || (eBehaviour == eNoData && oKnown.moNoData.empty()), "a tile is refused");
             continue;
         }
         Check(SamePixels(*oRaster, oKnown.Expect(*oRaster, eBehaviour)),
@@ -360,13 +378,12 @@ void CheckTiles(const Known& oKnown, Choices& oChoices)
         Check(oReader.FindRaster(nX, nY) == oTile, "the tile of a pixel");
         nPixels += std::uint64_t{oRaster->GetWidth()} * oRaster->GetHeight();
     }
-    if (nTile == oReader.GetTileCount() && eBehaviour != eException)
+    if (nTile == oReader.GetTileCount() && eBehaviour != eException && eBehaviour != eNoData)
         Check(nPixels == std::uint64_t{oReader.GetWidth()} * oReader.GetHeight(), "tiles make up the image");
 }
 
 void CheckWindow(const Known& oKnown, Choices& oChoices)
 {
-    constexpr eMarginBehaviour BEHAVIOURS[] = {eReplicate, eMirror, eMirror101, eConstant, eWrap, eException};
     IRasterReader& oReader = *oKnown.mpoReader;
     const int nImageWidth = static_cast<int>(oReader.GetWidth()), nImageHeight = static_cast<int>(oReader.GetHeight());
     const bool bAnywhere = oKnown.mbExact && oChoices.OneIn(2);
@@ -375,7 +392,7 @@ void CheckWindow(const Known& oKnown, Choices& oChoices)
         bAnywhere ? oChoices.Between(-nImageHeight, 2 * nImageHeight) : oChoices.Between(0, nImageHeight - 1);
     const unsigned int nWidth = 1 + oChoices.Below(bAnywhere ? nImageWidth : nImageWidth - nX);
     const unsigned int nHeight = 1 + oChoices.Below(bAnywhere ? nImageHeight : nImageHeight - nY);
-    const eMarginBehaviour eBehaviour = oChoices.Of(BEHAVIOURS);
+    const eMarginBehaviour eBehaviour = ChooseBehaviour(oChoices, oKnown);
     Raster oRaster({nWidth, nHeight, oReader.GetChansCount(), oReader.GetDataType()},
                    {nX, nY, oChoices.Below(2) * oChoices.Below(2 * nImageWidth + 2),
                     oChoices.Below(2) * oChoices.Below(2 * nImageHeight + 2)});

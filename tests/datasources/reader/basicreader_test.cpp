@@ -7,7 +7,6 @@
 #include "toolkit/ogc/cs/geocodinginfo.h"
 
 #include <limits>
-#include <random>
 
 using namespace krv::datasources;
 using namespace krv::test;
@@ -249,35 +248,6 @@ TEST_F(BasicReaderTest, AnswersFromEveryConstructor)
     }
 }
 
-TEST_F(BasicReaderTest, TilesCoverTheImage)
-{
-    BasicReader oReader(moFile, {2});
-    const ReferenceImage oImage = Image({2});
-    std::mt19937 oRandom(7);
-    for (int nRound = 0; nRound < 30; ++nRound)
-    {
-        const unsigned int nTileWidth = oRandom() % 25;
-        const unsigned int nTileHeight = oRandom() % 25;
-        oReader.SetTileSize(nTileWidth, nTileHeight);
-        EXPECT_EQ(oReader.GetTileWidth(), nTileWidth);
-        std::size_t nPixels = 0;
-        for (const RasterPtr& oTile : RasterRange(oReader))
-        {
-            nPixels += std::size_t(oTile->GetWidth()) * oTile->GetHeight();
-            EXPECT_EQ(PixelsOf(*oTile),
-                      oImage.Window(oTile->GetX(), oTile->GetY(), oTile->GetWidth(), oTile->GetHeight()));
-            EXPECT_LE(oTile->GetWidth(), std::max(1u, nTileWidth));
-            const RasterPtr oFound(*oReader.FindRaster(oTile->GetX() + oTile->GetWidth() - 1, oTile->GetY()));
-            EXPECT_EQ(oFound->GetContext(), oTile->GetContext());
-        }
-        EXPECT_EQ(nPixels, 21u * 17u) << nTileWidth << " x " << nTileHeight;
-        EXPECT_EQ(oReader.FindRaster(21, 0), oReader.End());
-        EXPECT_THROW(RasterPtr(oReader.GetRaster(oReader.GetTileCount())), krv::OutOfBoundsException);
-    }
-    oReader.SetOptimalTileSize();
-    EXPECT_EQ(oReader.GetTileHeight(), 6u);
-}
-
 TEST_F(BasicReaderTest, MarginsAreLimitedToHalfTheImage)
 {
     moModel->mnWidth = moModel->mnHeight = 5;
@@ -311,43 +281,6 @@ TEST_F(BasicReaderTest, MarginsAreLimitedToHalfTheImage)
     oReader.SetMargins(0, 0, eReplicate);
     EXPECT_EQ(oRaster->GetXMargin(), 1u);
     EXPECT_EQ(oRaster->GetYMargin(), 2u);
-}
-
-TEST_F(BasicReaderTest, RandomWindowsWithMarginsEqualTheNaiveModel)
-{
-    const krv::gobs::NativeDataTypeCode TYPES[] = {krv::gobs::eDT_8U, krv::gobs::eDT_16S, krv::gobs::eDT_C16U,
-                                                   krv::gobs::eDT_C64R};
-    const eMarginBehaviour BEHAVIOURS[] = {eReplicate, eMirror, eMirror101, eConstant, eWrap};
-    for (unsigned int nSeed = 1; nSeed <= 400; ++nSeed)
-    {
-        std::mt19937 oRandom(nSeed);
-        const auto Up = [&](unsigned int nLimit)
-        {
-            return static_cast<unsigned int>(oRandom() % (nLimit + 1));
-        };
-        moModel->mnWidth = 1 + Up(11);
-        moModel->mnHeight = 1 + Up(11);
-        moModel->moTypes.assign(3, TYPES[nSeed % 4]);
-        const Channels oChannels(1 + Up(2), 1 + Up(2));
-        BasicReader oReader(moFile, oChannels);
-        const ReferenceImage oImage = Image(oChannels);
-        for (int nWindow = 0; nWindow < 20; ++nWindow)
-        {
-            const unsigned int nX = Up(moModel->mnWidth - 1);
-            const unsigned int nY = Up(moModel->mnHeight - 1);
-            const unsigned int nWidth = 1 + Up(moModel->mnWidth - nX - 1);
-            const unsigned int nHeight = 1 + Up(moModel->mnHeight - nY - 1);
-            const unsigned int nXMargin = Up(1) * Up(2 * moModel->mnWidth);
-            const unsigned int nYMargin = Up(1) * Up(2 * moModel->mnHeight);
-            const eMarginBehaviour eBehaviour = BEHAVIOURS[Up(4)];
-            oReader.SetMargins(0, 0, eBehaviour); // the raster's own margins count
-            krv::gobs::Raster oRaster({nWidth, nHeight, oReader.GetChansCount(), oReader.GetDataType()},
-                                      {static_cast<int>(nX), static_cast<int>(nY), nXMargin, nYMargin});
-            oReader.ReadRaster(&oRaster);
-            ASSERT_EQ(PixelsOf(oRaster), oImage.WithMargins(nX, nY, nWidth, nHeight, nXMargin, nYMargin, eBehaviour))
-                << "seed " << nSeed << ", window " << nWindow;
-        }
-    }
 }
 
 // Which form of the transfer serves a window, and when the border is an error.

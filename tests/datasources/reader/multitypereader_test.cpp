@@ -4,10 +4,7 @@
 #include "datasources/reader/exacthaloreader.h"
 #include "datasources/reader/multitypeoverviewreaderaccessor.h"
 #include "tests/datasources/reader/readertest.h"
-#include "tests/support/conversionmodel.h"
 #include "tests/support/outputcapture.h"
-
-#include <cstring>
 
 namespace krv::test
 {
@@ -25,62 +22,9 @@ class MultiTypeReaderTest : public ReaderTest
 {
 protected:
     MultiTypeReaderTest() { moModel->moTypes = {krv::gobs::eDT_8U, krv::gobs::eDT_16U, krv::gobs::eDT_8U}; }
-
-    // A channel of a raster holds the same pixels of one file channel, converted; 0: it holds zeros.
-    void ExpectChannel(const krv::gobs::Raster& oRaster, unsigned int nPosition, unsigned int nFileChannel)
-    {
-        BasicReader oReader(moFile, Channels{std::max(nFileChannel, 1u)});
-        krv::gobs::Raster oSingle({oRaster.GetWidth(), oRaster.GetHeight(), 1, oReader.GetDataType()},
-                                  oRaster.GetContext());
-        oReader.ReadRaster(&oSingle);
-        if (nFileChannel == 0)
-            std::memset(oSingle.GetBuffer(), 0, oSingle.GetBufferSize());
-        const Type oFrom(oReader.GetDataType().GetNativeCode()), oTo(oRaster.GetDataType().GetNativeCode());
-        for (std::uint64_t n = 0; n < oRaster.GetFullWidth() * oRaster.GetFullHeight(); ++n)
-        {
-            unsigned char aExpected[16];
-            ModelValue(oSingle.GetBuffer() + n * oFrom.Bytes(), oFrom, aExpected, oTo);
-            const auto* pValue = oRaster.GetBuffer() + (n * oRaster.GetChansCount() + nPosition) * oTo.Bytes();
-            ASSERT_EQ(std::memcmp(pValue, aExpected, oTo.Bytes()), 0) << "channel " << nFileChannel << ", pixel " << n;
-        }
-    }
 };
 
 } // namespace
-
-TEST_F(MultiTypeReaderTest, ChannelsAreConvertedAndPlaced)
-{
-    using namespace krv::gobs;
-    using namespace krv::datasources;
-    struct Case
-    {
-        std::vector<DataType> moTypes;
-        Channels moNumbers;
-        DataType moTarget;
-        eChannelPlacement mePlacement;
-        Channels moExpected; // the channel at each position
-    };
-    const Case CASES[] = {
-        {{eDT_8U, eDT_16U, eDT_8U}, {1, 2, 3}, eDT_32R, eOwnPlace, {1, 2, 3}},
-        {{eDT_16S, eDT_C16U, eDT_64R, eDT_C64R}, {4, 3, 2, 1, 3}, eDT_C64R, eOwnPlace, {4, 3, 2, 1, 3}},
-        {{eDT_8S, eDT_C32S, eDT_64S, eDT_32U}, {1, 2, 3, 4, 1}, eDT_8U, eOwnPlace, {1, 2, 3, 4, 1}},
-        // The 8-bit group has the places 0 and 2 and lands on 0 and 1; the 16-bit one follows on 1; nothing on 2.
-        {{eDT_8U, eDT_16U, eDT_8U}, {1, 2, 3}, eDT_32R, eFromFirstPlace, {1, 2, 0}}};
-    const OutputCapture oOutput; // some lose something
-    for (const Case& oCase : CASES)
-    {
-        moModel->moTypes = oCase.moTypes;
-        moModel->moAuxiliary = AuxiliaryData(static_cast<unsigned int>(oCase.moTypes.size()));
-        MultiTypeReader oReader(moFile, oCase.moNumbers, oCase.moTarget, oCase.mePlacement);
-        oReader.SetMargins(2, 1, eMirror);
-        for (auto oTile = oReader.Begin(); oTile != oReader.End(); ++oTile)
-        {
-            const RasterPtr oRaster(*oTile);
-            for (unsigned int nPosition = 0; nPosition < oCase.moExpected.size(); ++nPosition)
-                ExpectChannel(*oRaster, nPosition, oCase.moExpected[nPosition]);
-        }
-    }
-}
 
 TEST_F(MultiTypeReaderTest, TypesArePromotedOrRequestedWithAWarning)
 {
@@ -137,15 +81,6 @@ TEST_F(MultiTypeReaderTest, LevelsAndReadyMadeReadersMakeOneImage)
     EXPECT_EQ(oLevel->GetWidth(), moModel->LevelWidth(2));
     EXPECT_EQ(oLevel->GetDataType(), DataType(krv::gobs::eDT_32R));
     EXPECT_EQ(oLevel->GetOverviewReaderAccessor(), nullptr);
-    const RasterPtr oRaster(oLevel->ReadRaster(0, 0, oLevel->GetWidth(), oLevel->GetHeight()));
-    const std::string wide = LevelImage(*moModel, 2, {2});
-    const Type oFrom(krv::gobs::eDT_16U), oTo(krv::gobs::eDT_32R);
-    for (std::size_t n = 0; n < wide.size() / 2; ++n)
-    {
-        unsigned char aExpected[4];
-        ModelValue(reinterpret_cast<const unsigned char*>(&wide[2 * n]), oFrom, aExpected, oTo);
-        ASSERT_EQ(std::memcmp(oRaster->GetBuffer() + (3 * n + 1) * 4, aExpected, 4), 0) << n;
-    }
 }
 
 // Refuses a tile width of 13.

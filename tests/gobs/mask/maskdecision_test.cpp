@@ -4,7 +4,6 @@
 #include "gobs/mask/mask.h"
 #include "gobs/mask/samplematch.h"
 #include "gobs/raster/raster.h"
-#include "tests/support/conversionmodel.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <gtest/gtest.h>
@@ -14,8 +13,6 @@
 #include <cstring>
 #include <limits>
 #include <memory>
-#include <random>
-#include <string>
 #include <vector>
 
 namespace krv::gobs
@@ -26,66 +23,6 @@ namespace
 
 constexpr double NOT_A_NUMBER = std::numeric_limits<double>::quiet_NaN();
 
-// Real and imaginary part of a sample; few values, so that matches are common.
-using Parts = std::complex<double>;
-
-std::vector<unsigned char> PackBits(const std::vector<Parts>& oSamples)
-{
-    std::vector<unsigned char> oBytes((oSamples.size() + 7) / 8);
-    for (std::size_t n = 0; n < oSamples.size(); ++n)
-    {
-        if (oSamples[n].real() != 0)
-            oBytes[n / 8] = static_cast<unsigned char>(oBytes[n / 8] | 128 >> n % 8);
-    }
-    return oBytes;
-}
-
-std::vector<unsigned char> Encode(NativeDataTypeCode eType, const std::vector<Parts>& oSamples)
-{
-    if (eType == eDT_BIT)
-        return PackBits(oSamples);
-    const test::Type oType(eType);
-    const auto nPartBytes = static_cast<std::size_t>(oType.mpoPart->mnBytes);
-    std::vector<unsigned char> oBytes(oSamples.size() * oType.Bytes());
-    for (std::size_t n = 0; n < oSamples.size(); ++n)
-    {
-        unsigned char* const pSample = &oBytes[n * oType.Bytes()];
-        oType.mpoPart->Store(pSample, oSamples[n].real());
-        if (oType.mnParts == 2)
-            oType.mpoPart->Store(pSample + nPartBytes, oSamples[n].imag());
-    }
-    return oBytes;
-}
-
-struct Decision
-{
-    BkgdRule meRule;
-    std::vector<double> moValues;
-    std::vector<unsigned int> moChannels;
-};
-
-bool Equals(const Parts& oSample, double nValue, bool bComplex)
-{
-    if (std::isnan(nValue))
-        return std::isnan(oSample.real()) && (!bComplex || std::isnan(oSample.imag()));
-    return oSample.real() == nValue && (!bComplex || oSample.imag() == 0);
-}
-
-bool IsBackground(const Parts* pPixel, unsigned int nChannels, const Decision& oDecision, bool bComplex)
-{
-    unsigned int nListed = 0;
-    unsigned int nEqual = 0;
-    for (std::size_t n = 0; n < oDecision.moChannels.size(); ++n)
-    {
-        const unsigned int nChannel = oDecision.moChannels[n];
-        if (nChannel < 1 || nChannel > nChannels)
-            continue;
-        ++nListed;
-        nEqual += Equals(pPixel[nChannel - 1], oDecision.moValues[n], bComplex) ? 1 : 0;
-    }
-    return oDecision.meRule == eAnyChannel ? nEqual > 0 : nListed > 0 && nEqual == nListed;
-}
-
 std::vector<unsigned char> Mark(const IMaskDecisionImpl& oImpl, const std::vector<unsigned char>& oPixels,
                                 std::size_t nPixels, unsigned int nChannels)
 {
@@ -95,46 +32,6 @@ std::vector<unsigned char> Mark(const IMaskDecisionImpl& oImpl, const std::vecto
     oBits.pop_back();
     return oBits;
 }
-
-class RandomDecisions
-{
-public:
-    explicit RandomDecisions(unsigned int nSeed) : moRandom(nSeed) {}
-
-    std::size_t Below(std::size_t nEnd) { return moRandom() % nEnd; }
-
-    Decision MakeDecision(NativeDataTypeCode eType, unsigned int nChannels)
-    {
-        const double VALUES[] = {0, 1, 1, DataType(eType).IsSigned() ? -1.0 : 1.0, 0.5, NOT_A_NUMBER, 1e30, -1};
-        Decision oDecision{Below(2) == 0 ? eAnyChannel : eAllChannels, {}, {}};
-        const bool bEvery = Below(2) == 0;
-        const bool bPlain = Below(2) == 0;
-        for (std::size_t n = 0; n < (bEvery ? nChannels : Below(4)); ++n)
-        {
-            oDecision.moChannels.push_back(bEvery ? static_cast<unsigned int>(n + 1)
-                                                  : static_cast<unsigned int>(Below(nChannels + 2)));
-            oDecision.moValues.push_back(VALUES[Below(bPlain ? 2 : std::size(VALUES))]);
-        }
-        return oDecision;
-    }
-
-    std::vector<Parts> MakeSamples(NativeDataTypeCode eType, std::size_t nCount)
-    {
-        const DataType oType(eType);
-        std::vector<double> oParts = {0, 1, 1};
-        if (oType.IsSigned())
-            oParts.push_back(-1);
-        if (oType.IsReal())
-            oParts.insert(oParts.end(), {-0.0, 0.5, NOT_A_NUMBER, NOT_A_NUMBER});
-        std::vector<Parts> oSamples(nCount);
-        for (Parts& oSample : oSamples)
-            oSample = {oParts[Below(oParts.size())], oType.IsComplex() ? oParts[Below(oParts.size())] : 0.0};
-        return oSamples;
-    }
-
-private:
-    std::mt19937 moRandom;
-};
 
 template <class Sample>
 bool Marks(NativeDataTypeCode eType, const SampleValue& oValue, Sample nSample, bool bNaNIsBackground = false)
@@ -156,28 +53,6 @@ bool Marks(NativeDataTypeCode eType, const SampleValue& oValue, Sample nSample, 
 }
 
 } // namespace
-
-TEST(MaskDecision, AgreesWithPixelByPixelComparison)
-{
-    const unsigned int nSeed = 7331;
-    RandomDecisions oRandom(nSeed);
-    for (int nRound = 0; nRound < 6000; ++nRound)
-    {
-        const auto eType = static_cast<NativeDataTypeCode>(oRandom.Below(16));
-        constexpr unsigned int CHANNELS[] = {1, 1, 2, 3, 4, 4, 5, 7, 8, 9, 16, 17, 40};
-        const unsigned int nChannels = CHANNELS[oRandom.Below(std::size(CHANNELS))];
-        const std::size_t nPixels = oRandom.Below(4) == 0 ? oRandom.Below(9) : oRandom.Below(140);
-        const Decision oDecision = oRandom.MakeDecision(eType, nChannels);
-        const auto oSamples = oRandom.MakeSamples(eType, nPixels * nChannels);
-        std::vector<Parts> oExpected(nPixels);
-        for (std::size_t n = 0; n < nPixels; ++n)
-            oExpected[n] = IsBackground(&oSamples[n * nChannels], nChannels, oDecision, DataType(eType).IsComplex());
-        const std::unique_ptr<IMaskDecisionImpl> oImpl(
-            GetMaskDecisionImpl(eType, nChannels, oDecision.meRule, oDecision.moValues, oDecision.moChannels));
-        ASSERT_EQ(Mark(*oImpl, Encode(eType, oSamples), nPixels, nChannels), PackBits(oExpected))
-            << "seed " << nSeed << " round " << nRound;
-    }
-}
 
 TEST(MaskDecision, ComparesInThePixelsOwnType)
 {
