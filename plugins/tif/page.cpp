@@ -88,6 +88,7 @@ bool PageForm::IsOwnCodec() const
     {
     case COMPRESSION_NONE:
     case COMPRESSION_LZW:
+    case COMPRESSION_PACKBITS:
     case COMPRESSION_ZSTD:
     case COMPRESSION_DEFLATE:
     case COMPRESSION_ADOBE_DEFLATE:

@@ -68,14 +68,10 @@ bool FindReal(SampleForm& oForm, bool bComplex)
     return true;
 }
 
-void WidenBits(const SampleForm& oForm, const unsigned char* pSource, unsigned char* pTarget, std::size_t nParts)
+// Parts of up to 8 bits of a complex integer: by way of bytes to words of 16 bits.
+void WidenSmallParts(const SampleForm& oForm, const unsigned char* pSource, unsigned char* pTarget, std::size_t nParts)
 {
-    const std::size_t nContainer = codec::GetContainerBytes(oForm.mnPartBits);
     const std::size_t nBytes = (nParts * oForm.mnPartBits + 7) / 8;
-    if (nContainer == oForm.GetPartBytes())
-        return codec::UnpackBits(pSource, nBytes, nBytes, pTarget, nParts * nContainer, nParts, 1, oForm.mnPartBits,
-                                 oForm.IsSigned());
-    // Parts of up to 8 bits of a complex integer: by way of bytes to words of 16 bits.
     unsigned char* pBytes = pTarget + nParts;
     codec::UnpackBits(pSource, nBytes, nBytes, pBytes, nParts, nParts, 1, oForm.mnPartBits, oForm.IsSigned());
     for (std::size_t nAt = 0; nAt < nParts; ++nAt)
@@ -83,6 +79,23 @@ void WidenBits(const SampleForm& oForm, const unsigned char* pSource, unsigned c
         const auto nValue = oForm.IsSigned() ? static_cast<std::int16_t>(static_cast<signed char>(pBytes[nAt]))
                                              : static_cast<std::int16_t>(pBytes[nAt]);
         std::memcpy(pTarget + 2 * nAt, &nValue, sizeof(nValue));
+    }
+}
+
+void WidenRow(const SampleForm& oForm, const unsigned char* pSource, unsigned char* pTarget, std::size_t nParts)
+{
+    switch (oForm.meWidening)
+    {
+    case Widening::eNone:
+        break;
+    case Widening::eBits:
+        return WidenSmallParts(oForm, pSource, pTarget, nParts);
+    case Widening::eThreeBytes:
+        return codec::Unpack24(pSource, pTarget, nParts, false, oForm.IsSigned());
+    case Widening::eHalf:
+        return codec::HalfToFloat(pSource, pTarget, nParts);
+    case Widening::eFloat24:
+        return codec::Float24ToFloat(pSource, pTarget, nParts);
     }
 }
 
@@ -117,22 +130,18 @@ bool FindSampleForm(unsigned int nBits, unsigned int nFormat, SampleForm& oForm,
     return bFound;
 }
 
-void WidenRow(const SampleForm& oForm, const unsigned char* pSource, unsigned char* pTarget, std::size_t nCount)
+void WidenRows(const SampleForm& oForm, const unsigned char* pSource, std::size_t nSourcePitch, unsigned char* pTarget,
+               std::size_t nTargetPitch, std::size_t nCount, std::size_t nRows)
 {
+    if (nRows == 0)
+        return;
     const std::size_t nParts = nCount * oForm.mnParts;
-    switch (oForm.meWidening)
-    {
-    case Widening::eNone:
-        break;
-    case Widening::eBits:
-        return WidenBits(oForm, pSource, pTarget, nParts);
-    case Widening::eThreeBytes:
-        return codec::Unpack24(pSource, pTarget, nParts, false, oForm.IsSigned());
-    case Widening::eHalf:
-        return codec::HalfToFloat(pSource, pTarget, nParts);
-    case Widening::eFloat24:
-        return codec::Float24ToFloat(pSource, pTarget, nParts);
-    }
+    const std::size_t nBytes = (nRows - 1) * nSourcePitch + (nParts * oForm.mnPartBits + 7) / 8;
+    if (oForm.meWidening == Widening::eBits && codec::GetContainerBytes(oForm.mnPartBits) == oForm.GetPartBytes())
+        return codec::UnpackBits(pSource, nBytes, nSourcePitch, pTarget, nTargetPitch, nParts, nRows, oForm.mnPartBits,
+                                 oForm.IsSigned());
+    for (std::size_t nRow = 0; nRow < nRows; ++nRow)
+        WidenRow(oForm, pSource + nRow * nSourcePitch, pTarget + nRow * nTargetPitch, nParts);
 }
 
 } // namespace krv::plugins::tif

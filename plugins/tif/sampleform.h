@@ -40,8 +40,9 @@ struct SampleForm
 bool FindSampleForm(unsigned int nBits, unsigned int nFormat, SampleForm& oForm, std::string& reason);
 
 // Turns stored samples into those handed out. Whole words of two and three bytes are in this machine's order, eBits are
-// packed most significant bit first and begin with the first byte. nCount counts samples.
+// packed most significant bit first and begin with the first byte. A row has nCount samples; pitches are in bytes.
 // Source and target do not overlap. Does nothing for eNone.
-void WidenRow(const SampleForm& oForm, const unsigned char* pSource, unsigned char* pTarget, std::size_t nCount);
+void WidenRows(const SampleForm& oForm, const unsigned char* pSource, std::size_t nSourcePitch, unsigned char* pTarget,
+               std::size_t nTargetPitch, std::size_t nCount, std::size_t nRows);
 
 } // namespace krv::plugins::tif

@@ -1,6 +1,7 @@
 #include "plugins/tif/striledecoder.h"
 
 #include "plugins/support/codec/bits.h"
+#include "plugins/support/codec/packbits.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <bit>
@@ -49,6 +50,8 @@ codec::Result StrileDecoder::DecodeOwn(const unsigned char* pRaw, std::size_t nR
     {
     case COMPRESSION_LZW:
         return moLzw.Decode(pRaw, nRaw, pTarget, nBytes);
+    case COMPRESSION_PACKBITS:
+        return codec::DecodePackBits(pRaw, nRaw, pTarget, nBytes);
     case COMPRESSION_ZSTD:
         return moZstd.Decode(pRaw, nRaw, pTarget, nBytes);
     default:
@@ -190,13 +193,10 @@ void StrileDecoder::Finish(unsigned char* pStored, std::size_t nStoredPitch, boo
     // Words of five to seven bytes are packed bits in big-endian files; libtiff leaves them as they are.
     const bool bLongWords = oSample.meWidening == Widening::eBits && oSample.mnPartBits % 8 == 0 && nPartBytes > 1;
     const bool bTurnWords = bLongWords ? !moForm.mbBigEndian : bTurn;
-    for (std::uint32_t nRow = 0; nRow < oWanted.mnRows; ++nRow)
-    {
-        unsigned char* pRow = pStored + nRow * nStoredPitch;
-        if (bTurnWords)
-            codec::SwapBytes(pRow, pRow, nSamples * oSample.mnParts, nPartBytes);
-        WidenRow(oSample, pRow, oWanted.mpTarget + nRow * oWanted.mnPitch, nSamples);
-    }
+    for (std::uint32_t nRow = 0; bTurnWords && nRow < oWanted.mnRows; ++nRow)
+        codec::SwapBytes(pStored + nRow * nStoredPitch, pStored + nRow * nStoredPitch, nSamples * oSample.mnParts,
+                         nPartBytes);
+    WidenRows(oSample, pStored, nStoredPitch, oWanted.mpTarget, oWanted.mnPitch, nSamples, oWanted.mnRows);
 }
 
 } // namespace krv::plugins::tif

@@ -132,7 +132,7 @@ std::uint32_t StrileSource::ReadPiece(const Piece& oPiece, std::uint32_t nRowsWa
         nRows = ReadPlain(oPiece, oStrile, nRowsWanted);
     else
         ReadCoded(oPiece, oStrile);
-    if (meUse == PixelUse::eBitmap)
+    if (meUse == PixelUse::eBitmap && (moForm.moSample.GetBits() != 1 || moForm.moSample.IsSigned()))
         ToBits({oPiece.moWanted.mnWidth, nRows, oPiece.moWanted.mpTarget, oPiece.moWanted.mnPitch});
     return nRows;
 }
@@ -190,13 +190,13 @@ void StrileSource::ReadPlainRows(std::uint64_t nOffset, unsigned int nX, const W
         return moDecoder.Convert(oWanted.mpTarget, oWanted.mnPitch, oWanted);
     }
     const auto nSlice = static_cast<std::uint32_t>(std::max<std::size_t>(1, SLICE_BYTES / nRowBytes));
-    std::vector<unsigned char> oStored(std::min(nSlice, oWanted.mnRows) * nRowBytes);
+    unsigned char* pStored = moPacked.Get(std::min(nSlice, oWanted.mnRows) * nRowBytes);
     for (std::uint32_t nRow = 0; nRow < oWanted.mnRows; nRow += nSlice)
     {
         const std::uint32_t nRows = std::min(nSlice, oWanted.mnRows - nRow);
         mpoPage->GetFile().ReadRows(nOffset + nRow * std::uint64_t{nStoredPitch}, nStoredPitch, nRowBytes, nRows,
-                                    oStored.data(), nRowBytes, moRows);
-        moDecoder.Convert(oStored.data(), nRowBytes,
+                                    pStored, nRowBytes, moRows);
+        moDecoder.Convert(pStored, nRowBytes,
                           {oWanted.mnWidth, nRows, oWanted.mpTarget + nRow * oWanted.mnPitch, oWanted.mnPitch});
     }
 }
@@ -210,22 +210,21 @@ void StrileSource::ReadPackedRows(std::uint64_t nOffset, unsigned int nX, const 
     nOffset += moForm.GetStoredRowBytes(nX - nSkip);
     const std::size_t nWidePitch = moForm.GetRowBytes(nSkip + oWanted.mnWidth);
     const auto nSlice = static_cast<std::uint32_t>(std::max<std::size_t>(1, SLICE_BYTES / nRowBytes));
-    const std::uint32_t nMost = std::min(nSlice, oWanted.mnRows);
-    std::vector<unsigned char> oStored(nMost * nRowBytes);
-    std::vector<unsigned char> oWide(nSkip == 0 ? 0 : nWidePitch);
+    unsigned char* pStored = moPacked.Get(std::min(nSlice, oWanted.mnRows) * nRowBytes);
+    unsigned char* pWide = nSkip == 0 ? nullptr : moWide.Get(nWidePitch);
     for (std::uint32_t nRow = 0; nRow < oWanted.mnRows; nRow += nSlice)
     {
         const std::uint32_t nRows = std::min(nSlice, oWanted.mnRows - nRow);
+        unsigned char* pTarget = oWanted.mpTarget + nRow * oWanted.mnPitch;
         mpoPage->GetFile().ReadRows(nOffset + nRow * std::uint64_t{nStoredPitch}, nStoredPitch, nRowBytes, nRows,
-                                    oStored.data(), nRowBytes, moRows);
-        for (std::uint32_t nAt = 0; nAt < nRows; ++nAt)
+                                    pStored, nRowBytes, moRows);
+        if (nSkip == 0)
+            moDecoder.Convert(pStored, nRowBytes, {oWanted.mnWidth, nRows, pTarget, oWanted.mnPitch});
+        for (std::uint32_t nAt = 0; nSkip != 0 && nAt < nRows; ++nAt)
         {
-            unsigned char* pTarget = oWanted.mpTarget + (nRow + nAt) * oWanted.mnPitch;
-            unsigned char* pStored = oStored.data() + nAt * nRowBytes;
-            moDecoder.Convert(pStored, nRowBytes,
-                              {nSkip + oWanted.mnWidth, 1, nSkip == 0 ? pTarget : oWide.data(), nWidePitch});
-            if (nSkip != 0)
-                std::memcpy(pTarget, oWide.data() + moForm.GetRowBytes(nSkip), moForm.GetRowBytes(oWanted.mnWidth));
+            moDecoder.Convert(pStored + nAt * nRowBytes, nRowBytes, {nSkip + oWanted.mnWidth, 1, pWide, nWidePitch});
+            std::memcpy(pTarget + nAt * oWanted.mnPitch, pWide + moForm.GetRowBytes(nSkip),
+                        moForm.GetRowBytes(oWanted.mnWidth));
         }
     }
 }

@@ -75,6 +75,8 @@ private:
     support::ImageLayout moLayout;
     StrileDecoder moDecoder;
     support::Scratch moRows;
+    support::Scratch moPacked;
+    support::Scratch moWide;
     // Stored bytes, read together with those of the strips that follow.
     support::Scratch moRaw;
     std::uint64_t mnRawOffset = 0;

@@ -269,6 +269,38 @@ void UnpackRows(const BitSource& oSource, std::size_t nSourcePitch, unsigned cha
                           nBits, bSigned);
 }
 
+// Eight pixels of one bit each, as bytes with the first one at the lowest address.
+std::uint64_t SpreadBits(unsigned char nBits)
+{
+    const std::uint64_t nApart = nBits * 0x0101010101010101U & 0x0102040810204080U;
+    return (nApart + 0x7F7F7F7F7F7F7F7FU) >> 7 & 0x0101010101010101U;
+}
+
+// A row of pixels of one bit, of which nBytes bytes can be read.
+void UnpackSingleBits(const unsigned char* source, std::size_t nBytes, unsigned char* destination, std::size_t nSamples)
+{
+    const std::size_t nWhole = std::min(nBytes, nSamples / 8);
+    std::size_t i = 0;
+#if defined(KRV_CODEC_VECTORS)
+    static constexpr Shuffle FIRST = Shuffle::Make([](std::size_t k) { return k / 8; });
+    const Vector oBits = _mm_set1_epi64x(0x0102040810204080);
+    const Vector oOne = _mm_set1_epi8(1);
+    const Vector oTwo = _mm_set1_epi8(2);
+    for (; i + 16 <= nWhole; i += 16)
+    {
+        const Vector oBytes = LoadVector(source + i);
+        Vector oPlaces = LoadVector(FIRST.maIndices);
+        for (std::size_t k = 0; k < 8; ++k, oPlaces = _mm_add_epi8(oPlaces, oTwo))
+            StoreVector(destination + i * 8 + k * 16,
+                        _mm_min_epu8(_mm_and_si128(_mm_shuffle_epi8(oBytes, oPlaces), oBits), oOne));
+    }
+#endif
+    for (; i < nWhole; ++i)
+        detail::StoreLittleEndian(destination + i * 8, SpreadBits(source[i]));
+    for (std::size_t k = i * 8; k < nSamples; ++k)
+        destination[k] = k / 8 < nBytes ? source[k / 8] >> (7 - k % 8) & 1 : 0;
+}
+
 // A number with fewer exponent and fraction bits as one of 32 bits.
 template <unsigned int nExponentBits, unsigned int nFractionBits>
 std::uint32_t Widen(std::uint32_t nNumber)
@@ -351,6 +383,13 @@ void UnpackBits(const unsigned char* source, std::size_t nSourceBytes, std::size
                 unsigned int nBits, bool bSigned)
 {
     const BitSource oSource{source, nSourceBytes};
+    if (nBits == 1 && !bSigned)
+    {
+        for (std::size_t i = 0; i < nRows; ++i)
+            UnpackSingleBits(source + i * nSourcePitch, nSourceBytes - std::min(nSourceBytes, i * nSourcePitch),
+                             destination + i * nDestinationPitch, nRowSamples);
+        return;
+    }
     switch (GetContainerBytes(nBits))
     {
     case 1:
