@@ -153,7 +153,13 @@ void TryPolygons(Choices& oChoices)
         if (oBuilder == nullptr)
             oBuilder = std::make_unique<PolygonMaskBuilder>(oShape, oPolygon.mnFirstRow, oPolygon.mnRows);
         else
-            oBuilder->AddPolygon(oShape, oPolygon.mnFirstRow, oPolygon.mnRows);
+        {
+            // As plain arrays, whose rows begin at 0.
+            const std::vector<int> oStarts(oShape.GetRingStarts().begin(), oShape.GetRingStarts().end());
+            oPolygon.mnFirstRow = 0;
+            oBuilder->AddPolygon(oShape.GetVertices().data(), static_cast<int>(oShape.GetVertices().size()),
+                                 oStarts.data(), static_cast<int>(oStarts.size()), oPolygon.mnRows);
+        }
         for (Ring& oRing : oPolygon.moRings)
             std::erase_if(oRing, [](const GDBVertex& o) { return !std::isfinite(o.x) || !std::isfinite(o.y); });
     }
