@@ -3,6 +3,7 @@
 #include "toolkit/exceptions/exceptions.h"
 
 #include <iterator>
+#include <utility>
 
 namespace krv::plugins::support
 {
@@ -40,6 +41,30 @@ void Space::Keep(std::uint64_t nOffset, std::uint64_t nBytes)
 
 Extent Space::Allocate(std::uint64_t nBytes, std::uint64_t nReserve, const Place& oPlace)
 {
+    const Extent oExtent = Take(nBytes, nReserve, oPlace);
+    if (mbOperation)
+        moTaken.push_back(oExtent);
+    return oExtent;
+}
+
+void Space::Adopt()
+{
+    mbOperation = false;
+    moTaken.clear();
+    for (const auto& [oExtent, nKept] : std::exchange(moReleased, {}))
+        Release(oExtent, nKept);
+}
+
+void Space::Undo()
+{
+    mbOperation = false;
+    moReleased.clear();
+    for (const Extent& oExtent : std::exchange(moTaken, {}))
+        AddFree(oExtent.mnOffset, oExtent.mnBytes);
+}
+
+Extent Space::Take(std::uint64_t nBytes, std::uint64_t nReserve, const Place& oPlace)
+{
     const std::uint64_t nTaken = nBytes + nBytes % 2;
     const auto oFit = moBySize.lower_bound({nTaken, 0});
     if (oFit != moBySize.end())
@@ -63,6 +88,8 @@ Extent Space::Allocate(std::uint64_t nBytes, std::uint64_t nReserve, const Place
 
 void Space::Release(const Extent& oExtent, std::uint64_t nKept)
 {
+    if (mbOperation)
+        return moReleased.push_back({oExtent, nKept});
     nKept += nKept % 2;
     if (nKept >= oExtent.mnBytes)
         return;

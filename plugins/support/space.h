@@ -46,6 +46,12 @@ public:
     // The first part of a fresh piece stays in use when nKept is above 0.
     void Release(const Extent& oExtent, std::uint64_t nKept = 0);
 
+    // An operation of several steps: what it gives up stays taken until it is adopted; when it is undone, what it took
+    // is free again and what it gave up is not.
+    void Begin() { mbOperation = true; }
+    void Adopt();
+    void Undo();
+
     // Whether no state that anybody could read has the piece: it may be overwritten.
     bool IsFresh(const Extent& oExtent) const { return oExtent.mnGeneration == mnGeneration; }
 
@@ -67,6 +73,7 @@ private:
         std::uint64_t mnSince = 0; // the first state without it; 0 while that is not written
     };
 
+    Extent Take(std::uint64_t nBytes, std::uint64_t nReserve, const Place& oPlace);
     void AddFree(std::uint64_t nOffset, std::uint64_t nBytes);
     void RemoveFree(std::map<std::uint64_t, std::uint64_t>::iterator oFree);
 
@@ -80,6 +87,9 @@ private:
     std::map<std::uint64_t, std::uint64_t> moKept;  // offset, end
     std::map<std::uint64_t, std::uint64_t> moRoots; // of states that may be held: root, generation
     std::vector<GivenUp> moGivenUp;
+    bool mbOperation = false;
+    std::vector<Extent> moTaken;                              // by the operation
+    std::vector<std::pair<Extent, std::uint64_t>> moReleased; // by it, with what is kept of each
 };
 
 } // namespace krv::plugins::support

@@ -90,15 +90,12 @@ private:
     std::string ReadName(const RawDirectory& oDirectory)
     {
         const DirectoryEntry* pEntry = oDirectory.Find(TIFFTAG_PAGENAME);
-        if (pEntry == nullptr || pEntry->mnType != TIFF_ASCII || pEntry->mnCount > LONGEST_NAME)
+        if (pEntry == nullptr || pEntry->mnType != TIFF_ASCII || pEntry->mnCount > LONGEST_PAGE_NAME)
             return {};
-        char aName[LONGEST_NAME + 1] = {};
+        char aName[LONGEST_PAGE_NAME + 1] = {};
         moReader.Read(pEntry->mnOffset, aName, static_cast<std::size_t>(pEntry->mnCount));
         return aName;
     }
-
-    static constexpr std::size_t MAXIMUM_SUBDIRECTORIES = 4096;
-    static constexpr std::size_t LONGEST_NAME = 32;
 
     PeekReader& moReader;
     FileHeader moHeader;

@@ -37,6 +37,9 @@ unsigned int ParsePageName(const std::string& name, bool bLevel);
 std::vector<PageSummary> ListPages(PeekReader& oReader, const FileHeader& oHeader);
 
 constexpr std::size_t MAXIMUM_PAGES = 65535;
+constexpr std::size_t MAXIMUM_SUBDIRECTORIES = 4096;
+// No longer name gives a page its number.
+constexpr std::size_t LONGEST_PAGE_NAME = 32;
 
 // A reduced page of a full-size one.
 struct PageLevel

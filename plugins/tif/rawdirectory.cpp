@@ -19,22 +19,6 @@ void WriteNumber(unsigned char* pBytes, std::size_t nBytes, bool bBigEndian, std
         pBytes[bBigEndian ? nBytes - 1 - nAt : nAt] = static_cast<unsigned char>(nValue >> (8 * nAt));
 }
 
-bool IsWholeType(std::uint16_t nType)
-{
-    switch (nType)
-    {
-    case 1: // unsigned of 8, 16, 32, 64 bits and the offsets of directories
-    case 3:
-    case 4:
-    case 13:
-    case 16:
-    case 18:
-        return true;
-    default:
-        return false;
-    }
-}
-
 [[noreturn]] void ThrowDamaged(const std::string& fileName, const std::string& what, const Place& oPlace)
 {
     throw FileFormatException(fileName, fileName + ": " + what, oPlace);
@@ -54,6 +38,22 @@ std::size_t GetTypeBytes(std::uint16_t nType)
 {
     constexpr std::size_t BYTES[] = {0, 1, 1, 2, 4, 8, 1, 1, 2, 4, 8, 4, 8, 4, 0, 0, 8, 8, 8};
     return nType < std::size(BYTES) ? BYTES[nType] : 0;
+}
+
+bool IsWholeType(std::uint16_t nType)
+{
+    switch (nType)
+    {
+    case 1: // unsigned of 8, 16, 32, 64 bits and the offsets of directories
+    case 3:
+    case 4:
+    case 13:
+    case 16:
+    case 18:
+        return true;
+    default:
+        return false;
+    }
 }
 
 std::optional<FileHeader> FileHeader::Parse(const unsigned char* pBytes, std::size_t nBytes)

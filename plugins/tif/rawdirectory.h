@@ -34,6 +34,9 @@ std::uint64_t ReadNumber(const unsigned char* pBytes, std::size_t nBytes, bool b
 // Bytes of one value of a tag's type; 0 for a type that is not known.
 std::size_t GetTypeBytes(std::uint16_t nType);
 
+// Whether the type is one of unsigned whole numbers or offsets: what geometry and roles are taken from.
+bool IsWholeType(std::uint16_t nType);
+
 struct DirectoryEntry
 {
     std::uint16_t mnTag = 0;

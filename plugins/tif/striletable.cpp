@@ -60,21 +60,26 @@ std::uint64_t StrileArray::Get(const support::File& oFile, std::uint64_t nIndex)
     return oPage.moValues[nIndex % PAGE_VALUES];
 }
 
+StrileEntries::StrileEntries(const RawDirectory& oDirectory)
+    : mpOffsets(FindEither(oDirectory, TIFFTAG_TILEOFFSETS, TIFFTAG_STRIPOFFSETS)),
+      mpByteCounts(FindEither(oDirectory, TIFFTAG_TILEBYTECOUNTS, TIFFTAG_STRIPBYTECOUNTS))
+{
+}
+
 IStrileIndex::~IStrileIndex() = default;
 
 StrileTable::StrileTable(const support::File& oFile, const RawDirectory& oDirectory, bool bBigEndian,
                          std::uint64_t nStriles)
     : moFile(oFile)
 {
-    const DirectoryEntry* pOffsets = FindEither(oDirectory, TIFFTAG_TILEOFFSETS, TIFFTAG_STRIPOFFSETS);
-    const DirectoryEntry* pBytes = FindEither(oDirectory, TIFFTAG_TILEBYTECOUNTS, TIFFTAG_STRIPBYTECOUNTS);
-    if (pOffsets == nullptr)
+    const StrileEntries oEntries(oDirectory);
+    if (oEntries.mpOffsets == nullptr)
         throw FileFormatException(oFile.GetName(), oFile.GetName() + ": the directory does not say where the " +
                                                        std::to_string(nStriles) + " strips or tiles lie");
-    moOffsets = StrileArray(oFile, *pOffsets, bBigEndian);
-    mbByteCounts = pBytes != nullptr;
+    moOffsets = StrileArray(oFile, *oEntries.mpOffsets, bBigEndian);
+    mbByteCounts = oEntries.mpByteCounts != nullptr;
     if (mbByteCounts)
-        moByteCounts = StrileArray(oFile, *pBytes, bBigEndian);
+        moByteCounts = StrileArray(oFile, *oEntries.mpByteCounts, bBigEndian);
 }
 
 Strile StrileTable::Get(std::uint64_t nIndex)

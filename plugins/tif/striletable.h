@@ -51,6 +51,15 @@ struct Strile
     bool mbBytesKnown = true;  // false when the file does not say
 };
 
+// The entries of a directory that list the strips or tiles; those of tiles count first. Null where there is none.
+struct StrileEntries
+{
+    const DirectoryEntry* mpOffsets = nullptr;
+    const DirectoryEntry* mpByteCounts = nullptr;
+
+    explicit StrileEntries(const RawDirectory& oDirectory);
+};
+
 // Where strips and tiles lie while a file is being written: known in memory before it stands in the file.
 class IStrileIndex
 {

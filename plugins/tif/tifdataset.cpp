@@ -108,7 +108,15 @@ void TifDataset::OpenImage()
 {
     mpoFile = mpoEditor->GetFile();
     mpoPage = mpoEditor->OpenPage(mpoEditor->GetPages().front());
-    SetImage(MakeSource(mpoEditor->GetPages().front(), PixelUse::eImage));
+    ShowImage(MakeSource(mpoEditor->GetPages().front(), PixelUse::eImage));
+}
+
+void TifDataset::ShowImage(std::unique_ptr<support::IBlockSource> poSource)
+{
+    if (const auto* poEdited = dynamic_cast<const EditedSource*>(poSource.get()))
+        mpoImageWriter = poEdited->GetWriter();
+    WatchImage();
+    SetImage(std::move(poSource));
 }
 
 // Pages that are only read row by row stay so.
@@ -121,11 +129,6 @@ std::unique_ptr<support::IBlockSource> TifDataset::MakeSource(const std::shared_
         return MakePageSource(std::move(poPage), eUse);
     const auto poWriter = std::make_shared<PageWriter>(mpoEditor, poModel, std::move(poPage), eUse);
     mpoEditor->Register(poWriter);
-    if (poModel == mpoEditor->GetPages().front())
-    {
-        mpoImageWriter = poWriter;
-        WatchImage();
-    }
     return std::make_unique<EditedSource>(poWriter);
 }
 
@@ -139,12 +142,51 @@ FileEditor& TifDataset::GetEditor(const char* pWhat, const Place& oPlace) const
     return *mpoEditor;
 }
 
-void TifDataset::Refresh() const
+void TifDataset::ForgetPages() const
 {
     mpoPages.reset();
     moBooks.clear();
     moGeocoding.reset();
-    mpoPage = mpoEditor->OpenPage(mpoEditor->GetPages().front());
+}
+
+// The image is opened again before the change counts: what readers would refuse is refused here.
+void TifDataset::Edit(const std::function<void()>& oAction) const
+{
+    try
+    {
+        FileEditor::Operation oOperation(*mpoEditor);
+        oAction();
+        std::shared_ptr<Page> poPage = mpoEditor->OpenPage(mpoEditor->GetPages().front());
+        oOperation.Adopt();
+        mpoPage = std::move(poPage);
+    }
+    catch (...)
+    {
+        ForgetPages();
+        throw;
+    }
+    ForgetPages();
+}
+
+// A page that was just made: what cannot be read, or is not taken for what it is to be, is refused.
+void TifDataset::AddPage(const std::shared_ptr<PageModel>& poPage, const Place& oPlace)
+{
+    mpoEditor->AddPage(poPage);
+    mpoEditor->OpenPage(poPage);
+    ForgetPages();
+    const PageTable& oTable = GetPages();
+    const auto IsIt = [&poPage](const PageSummary& oPage)
+    {
+        return oPage.mnOffset == poPage->mnNumber;
+    };
+    const auto HasIt = [&IsIt](const std::vector<PageLevel>& oLevels)
+    {
+        return std::any_of(oLevels.begin(), oLevels.end(),
+                           [&IsIt](const PageLevel& oLevel) { return IsIt(oLevel.moPage); });
+    };
+    if (!HasIt(oTable.moLevels) && !HasIt(oTable.moMaskLevels) &&
+        std::none_of(oTable.moMasks.begin(), oTable.moMasks.end(), IsIt))
+        Refuse("a level or a bitmap of such an image cannot be made", oPlace);
 }
 
 void TifDataset::Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes)
@@ -167,8 +209,18 @@ void TifDataset::Create(unsigned int nWidth, unsigned int nHeight, const std::ve
     oTypes.front().GetNativeCode(oPlace);
     if (oTypes.front().GetBits() < 8)
         Refuse("channels of single bits cannot be laid out; bitmaps can", oPlace);
-    mpoEditor->AddFirstPage({nWidth, nHeight, static_cast<std::uint16_t>(oTypes.size()), oTypes.front()}, oPlace);
-    OpenImage();
+    try
+    {
+        mpoEditor->AddFirstPage({nWidth, nHeight, static_cast<std::uint16_t>(oTypes.size()), oTypes.front()}, oPlace);
+        OpenImage();
+    }
+    catch (...)
+    {
+        mpoPage.reset();
+        mpoFile.reset();
+        mpoEditor->Restart();
+        throw;
+    }
 }
 
 bool TifDataset::Exists() const
@@ -229,6 +281,9 @@ const TifDataset::PageTable& TifDataset::GetPages() const
             mpoEditor ? mpoEditor->Summarise() : ListPages(oPage.GetReader(), oPage.GetHeader());
         mpoPages =
             std::make_unique<PageTable>(PageTable{FindLevels(oPages), FindMasks(oPages), FindMaskLevels(oPages)});
+        // Reduced masks of no mask are no levels of anything.
+        if (mpoPages->moMasks.empty() || !mpoPages->moMasks.front().mbMask)
+            mpoPages->moMaskLevels.clear();
     }
     return *mpoPages;
 }
@@ -279,17 +334,19 @@ void TifDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData
         for (unsigned int nChannel = 1; nChannel <= std::min(oData.GetChannelCount(), GetChanCount()); ++nChannel)
             oRecord.SetChanMetadataValue(BookKey(oLevel.mnLevel),
                                          oBook.GetChanMetadataValue(BookKey(oLevel.mnLevel), nChannel), nChannel);
-    MetadataWriter(oEditor, oEditor.GetPages().front()).Write(oRecord, oPlace);
-    Refresh();
+    Edit([&] { MetadataWriter(oEditor, oEditor.GetPages().front()).Write(oRecord, oPlace); });
 }
 
 void TifDataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
 {
     const Place oPlace = Place::Current();
     FileEditor& oEditor = GetEditor("the reference system cannot be written", oPlace);
-    oEditor.LoadTags(*oEditor.GetPages().front());
-    GeoWriter(oEditor, oEditor.GetPages().front()).SetCRS(oCRS, oPlace);
-    Refresh();
+    Edit(
+        [&]
+        {
+            oEditor.LoadTags(*oEditor.GetPages().front());
+            GeoWriter(oEditor, oEditor.GetPages().front()).SetCRS(oCRS, oPlace);
+        });
 }
 
 void TifDataset::AddNewChannel(const krv::gobs::RasterInfo& oInfo)
@@ -350,14 +407,18 @@ void TifDataset::ChangeChannels(const std::vector<unsigned int>& oSources, const
     for (const PageLevel& oLevel : GetLevels(PixelUse::eImage))
         oNumbers.push_back(oLevel.moPage.mnOffset);
     const ChannelEditor oChannels(oEditor, oSources);
-    oChannels.CheckCodec(*oEditor.GetPages().front(), oPlace);
-    MetadataWriter(oEditor, oEditor.GetPages().front()).Write(oBare, oPlace);
-    for (const std::uint64_t nNumber : oNumbers)
-        oChannels.Rebuild(oEditor.GetPage(nNumber));
-    MetadataWriter(oEditor, oEditor.GetPages().front()).Write(oNew, oPlace);
+    std::unique_ptr<support::IBlockSource> poSource;
+    Edit(
+        [&]
+        {
+            MetadataWriter(oEditor, oEditor.GetPages().front()).Write(oBare, oPlace);
+            for (const std::uint64_t nNumber : oNumbers)
+                oChannels.Rebuild(oEditor.GetPage(nNumber), oPlace);
+            MetadataWriter(oEditor, oEditor.GetPages().front()).Write(oNew, oPlace);
+            poSource = MakeSource(oEditor.GetPages().front(), PixelUse::eImage);
+        });
     moImages.clear();
-    Refresh();
-    OpenImage();
+    ShowImage(std::move(poSource));
 }
 
 krv::ogc::cs::ICRS* TifDataset::ReadCRS() const
@@ -388,9 +449,12 @@ void TifDataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
     FileEditor& oEditor = GetEditor("the geocoding cannot be written", oPlace);
     if (!oInfo.IsInvertible())
         Refuse("a geocoding without an inverse cannot be written", oPlace);
-    oEditor.LoadTags(*oEditor.GetPages().front());
-    GeoWriter(oEditor, oEditor.GetPages().front()).SetGeocoding(oInfo);
-    Refresh();
+    Edit(
+        [&]
+        {
+            oEditor.LoadTags(*oEditor.GetPages().front());
+            GeoWriter(oEditor, oEditor.GetPages().front()).SetGeocoding(oInfo);
+        });
 }
 
 std::vector<unsigned int> TifDataset::GetBitmapList() const
@@ -431,27 +495,25 @@ void TifDataset::DeleteBitmap(unsigned int nBitmap)
     FileEditor& oEditor = GetEditor("bitmaps cannot be deleted", oPlace);
     const std::uint64_t nGone = GetMask(nBitmap, oPlace).mnOffset;
     const PageTable oTable = GetPages();
-    for (const PageSummary& oMask : oTable.moMasks)
-    {
-        TagList& oTags = oEditor.GetPage(oMask.mnOffset)->moTags;
-        const std::string name = MakePageName(oMask.mnNumber, false);
-        if (oTags.GetText(TIFFTAG_PAGENAME) != name)
-            oTags.SetText(TIFFTAG_PAGENAME, name);
-    }
-    oEditor.RemovePage(nGone);
-    moImages.erase({nGone, PixelUse::eBitmap});
+    std::vector<std::uint64_t> oGone = {nGone};
     if (oTable.moMasks.front().mnOffset == nGone)
-        RemoveMaskLevels(oTable.moMaskLevels);
-    Refresh();
-}
-
-void TifDataset::RemoveMaskLevels(const std::vector<PageLevel>& oLevels)
-{
-    for (const PageLevel& oLevel : oLevels)
-    {
-        mpoEditor->RemovePage(oLevel.moPage.mnOffset);
-        moImages.erase({oLevel.moPage.mnOffset, PixelUse::eBitmap});
-    }
+        for (const PageLevel& oLevel : oTable.moMaskLevels)
+            oGone.push_back(oLevel.moPage.mnOffset);
+    Edit(
+        [&]
+        {
+            for (const PageSummary& oMask : oTable.moMasks)
+            {
+                TagList& oTags = oEditor.GetPage(oMask.mnOffset)->moTags;
+                const std::string name = MakePageName(oMask.mnNumber, false);
+                if (oTags.GetText(TIFFTAG_PAGENAME) != name)
+                    oTags.SetText(TIFFTAG_PAGENAME, name);
+            }
+            for (const std::uint64_t nPage : oGone)
+                oEditor.RemovePage(nPage);
+        });
+    for (const std::uint64_t nPage : oGone)
+        moImages.erase({nPage, PixelUse::eBitmap});
 }
 
 unsigned int TifDataset::CreateBitmap()
@@ -460,8 +522,7 @@ unsigned int TifDataset::CreateBitmap()
     FileEditor& oEditor = GetEditor("bitmaps cannot be added", oPlace);
     const std::vector<unsigned int> oList = GetBitmapList();
     const unsigned int nBitmap = oList.empty() ? 1 : oList.back() + 1;
-    oEditor.AddPage(MakeBitmapPage(*oEditor.GetPages().front(), nBitmap));
-    Refresh();
+    Edit([&] { AddPage(MakeBitmapPage(*oEditor.GetPages().front(), nBitmap), oPlace); });
     return nBitmap;
 }
 
@@ -477,14 +538,23 @@ void TifDataset::SetBitmapDescription(unsigned int nBitmap, const std::string& o
 {
     const Place oPlace = Place::Current();
     FileEditor& oEditor = GetEditor("bitmaps cannot be written", oPlace);
-    const std::uint64_t nMask = GetLevelBitmap();
+    const unsigned int nMask = GetLevelBitmap();
+    const std::uint64_t nPage = GetMask(nBitmap, oPlace).mnOffset;
     const std::vector<PageLevel> oLevels = GetPages().moMaskLevels;
-    SetBitmapKind(*oEditor.GetPage(GetMask(nBitmap, oPlace).mnOffset), nBitmap, oDescription);
-    Refresh();
-    if (GetLevelBitmap() == nMask)
-        return;
-    RemoveMaskLevels(oLevels);
-    Refresh();
+    bool bOther = false;
+    Edit(
+        [&]
+        {
+            SetBitmapKind(*oEditor.GetPage(nPage), nBitmap, oDescription);
+            ForgetPages();
+            bOther = GetLevelBitmap() != nMask;
+            for (const PageLevel& oLevel : oLevels)
+                if (bOther)
+                    oEditor.RemovePage(oLevel.moPage.mnOffset);
+        });
+    for (const PageLevel& oLevel : oLevels)
+        if (bOther)
+            moImages.erase({oLevel.moPage.mnOffset, PixelUse::eBitmap});
 }
 
 krv::datasources::MetadataMap TifDataset::GetBitmapMetadata(unsigned int nBitmap) const
@@ -506,8 +576,7 @@ void TifDataset::SetBitmapMetadata(unsigned int nBitmap, const krv::datasources:
     for (const char* pKey : MASK_KEYS)
         oMap[pKey] = oRecord.GetFileMetadataValue(pKey);
     oRecord.SetFileMetadata(oMap);
-    MetadataWriter(oEditor, oEditor.GetPage(nPage)).Write(oRecord, oPlace);
-    Refresh();
+    Edit([&] { MetadataWriter(oEditor, oEditor.GetPage(nPage)).Write(oRecord, oPlace); });
 }
 
 krv::datasources::IOverviewManager* TifDataset::GetBitmapOverviewManager()
@@ -583,10 +652,15 @@ void TifDataset::StorePCT(const krv::gobs::PCT& oTable, const Place& oPlace)
         oColours[nColours + nAt] = oColour.green;
         oColours[2 * nColours + nAt] = oColour.blue;
     }
-    TagList& oTags = mpoEditor->GetPages().front()->moTags;
-    oTags.SetNumbers(TIFFTAG_COLORMAP, TIFF_SHORT, oColours);
-    oTags.SetNumber(TIFFTAG_PHOTOMETRIC, TIFF_SHORT, PHOTOMETRIC_PALETTE);
-    Refresh();
+    Edit(
+        [&]
+        {
+            TagList& oTags = mpoEditor->GetPages().front()->moTags;
+            oTags.SetNumbers(TIFFTAG_COLORMAP, TIFF_SHORT, oColours);
+            oTags.SetNumber(TIFFTAG_PHOTOMETRIC, TIFF_SHORT, PHOTOMETRIC_PALETTE);
+            // Readers size the table by it, and take none for granted.
+            oTags.SetNumber(TIFFTAG_BITSPERSAMPLE, TIFF_SHORT, oSample.GetBits());
+        });
 }
 
 void TifDataset::UpdatePCT(unsigned int nPCT, const krv::gobs::PCT& oTable)
@@ -608,9 +682,12 @@ void TifDataset::DeletePCT(unsigned int nPCT)
     FileEditor& oEditor = GetEditor("pseudocolour tables cannot be deleted", oPlace);
     CheckPCT(nPCT, oPlace);
     TagList& oTags = oEditor.GetPages().front()->moTags;
-    oTags.Remove(TIFFTAG_COLORMAP);
-    oTags.SetNumber(TIFFTAG_PHOTOMETRIC, TIFF_SHORT, PHOTOMETRIC_MINISBLACK);
-    Refresh();
+    Edit(
+        [&oTags]
+        {
+            oTags.Remove(TIFFTAG_COLORMAP);
+            oTags.SetNumber(TIFFTAG_PHOTOMETRIC, TIFF_SHORT, PHOTOMETRIC_MINISBLACK);
+        });
 }
 
 std::uint64_t TifDataset::GetFullPage(PixelUse eUse) const
@@ -632,8 +709,7 @@ const krv::datasources::AuxiliaryData& TifDataset::GetBook(PixelUse eUse) const
 
 void TifDataset::WriteBook(const krv::datasources::AuxiliaryData& oBook, PixelUse eUse, const Place& oPlace)
 {
-    MetadataWriter(*mpoEditor, mpoEditor->GetPage(GetFullPage(eUse))).Write(oBook, oPlace);
-    Refresh();
+    Edit([&] { MetadataWriter(*mpoEditor, mpoEditor->GetPage(GetFullPage(eUse))).Write(oBook, oPlace); });
 }
 
 // A file whose further pages are damaged can be read, and nobody knows what of it is used.
@@ -661,31 +737,52 @@ void TifDataset::CreateLevel(unsigned int nLevel, PixelUse eUse, const Place& oP
     if (nLevel < 2 || (GetWidth() == 1 && GetHeight() == 1))
         Refuse("there is no level " + std::to_string(nLevel) + " of such an image", oPlace);
     const std::shared_ptr<PageModel> poFull = oEditor.GetPage(GetFullPage(eUse));
-    oEditor.LoadTags(*poFull);
-    const std::shared_ptr<PageModel> poLevel =
-        MakeReducedPage(*poFull, (GetWidth() - 1) / nLevel + 1, (GetHeight() - 1) / nLevel + 1);
-    poLevel->moTags.SetText(TIFFTAG_PAGENAME, MakePageName(nLevel, true));
-    oEditor.AddPage(poLevel);
     krv::datasources::AuxiliaryData oBook = GetBook(eUse);
     for (unsigned int nChannel = 1; nChannel <= oBook.GetChannelCount(); ++nChannel)
         oBook.SetChanMetadataValue(BookKey(nLevel), INVALID, nChannel);
-    WriteBook(oBook, eUse, oPlace);
+    Edit(
+        [&]
+        {
+            oEditor.LoadTags(*poFull);
+            const std::shared_ptr<PageModel> poLevel =
+                MakeReducedPage(*poFull, (GetWidth() - 1) / nLevel + 1, (GetHeight() - 1) / nLevel + 1);
+            poLevel->moTags.SetNumber(TIFFTAG_SUBFILETYPE, TIFF_LONG,
+                                      FILETYPE_REDUCEDIMAGE | (eUse == PixelUse::eBitmap ? FILETYPE_MASK : 0));
+            poLevel->moTags.SetText(TIFFTAG_PAGENAME, MakePageName(nLevel, true));
+            AddPage(poLevel, oPlace);
+            WriteBook(oBook, eUse, oPlace);
+        });
 }
 
 void TifDataset::DeleteLevel(unsigned int nLevel, PixelUse eUse, const Place& oPlace)
 {
     FileEditor& oEditor = GetEditor("overviews cannot be deleted", oPlace);
     krv::datasources::AuxiliaryData oBook = GetBook(eUse);
-    const std::vector<PageLevel> oLevels = GetLevels(eUse);
-    for (const PageLevel& oLevel : oLevels)
-        if (oLevel.mnLevel == nLevel)
-        {
-            oEditor.RemovePage(oLevel.moPage.mnOffset);
-            moImages.erase({oLevel.moPage.mnOffset, eUse});
-        }
     for (unsigned int nChannel = 1; nChannel <= oBook.GetChannelCount(); ++nChannel)
         oBook.RemoveChanMetadataValue(BookKey(nLevel), nChannel);
-    WriteBook(oBook, eUse, oPlace);
+    std::vector<std::uint64_t> oGone;
+    Edit(
+        [&]
+        {
+            // A smaller page of that number takes the place of the one that counted.
+            const auto HasNumber = [nLevel](const PageLevel& oLevel)
+            {
+                return oLevel.mnLevel == nLevel;
+            };
+            for (;;)
+            {
+                const std::vector<PageLevel>& oLevels = GetLevels(eUse);
+                const auto oFound = std::find_if(oLevels.begin(), oLevels.end(), HasNumber);
+                if (oFound == oLevels.end())
+                    break;
+                oGone.push_back(oFound->moPage.mnOffset);
+                oEditor.RemovePage(oGone.back());
+                ForgetPages();
+            }
+            WriteBook(oBook, eUse, oPlace);
+        });
+    for (const std::uint64_t nPage : oGone)
+        moImages.erase({nPage, eUse});
 }
 
 bool TifDataset::IsLevelValid(unsigned int nChannel, unsigned int nLevel, PixelUse eUse) const

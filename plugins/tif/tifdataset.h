@@ -12,6 +12,7 @@
 #include "plugins/tif/writing/fileeditor.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 
+#include <functional>
 #include <map>
 #include <memory>
 #include <optional>
@@ -113,12 +114,14 @@ private:
     void WriteBook(const krv::datasources::AuxiliaryData& oBook, PixelUse eUse, const Place& oPlace);
     void WatchImage();
     void InvalidateLevels();
-    void RemoveMaskLevels(const std::vector<PageLevel>& oLevels);
     void StorePCT(const krv::gobs::PCT& oTable, const Place& oPlace);
     std::unique_ptr<support::IBlockSource> MakeSource(const std::shared_ptr<PageModel>& poModel, PixelUse eUse);
     FileEditor& GetEditor(const char* pWhat, const Place& oPlace) const;
-    // After the pages of the file came, went or changed their tags.
-    void Refresh() const;
+    // An operation that changes the structure of the file: all of it, or nothing when it throws.
+    void Edit(const std::function<void()>& oAction) const;
+    void AddPage(const std::shared_ptr<PageModel>& poPage, const Place& oPlace);
+    void ForgetPages() const;
+    void ShowImage(std::unique_ptr<support::IBlockSource> poSource);
     Page& GetPage(const Place& oPlace = Place::Current()) const;
     const PageTable& GetPages() const;
     const PageSummary& GetMask(unsigned int nBitmap, const Place& oPlace) const;

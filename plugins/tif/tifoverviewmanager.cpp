@@ -34,7 +34,7 @@ const PageLevel& TifOverviewManager::Get(unsigned int nLevel, const Place& oPlac
 unsigned int TifOverviewManager::FindChannel(unsigned int nChannel) const
 {
     if (meUse == PixelUse::eBitmap)
-        return nChannel == moDataset.GetLevelBitmap() ? 1 : 0;
+        return nChannel != 0 && nChannel == moDataset.GetLevelBitmap() ? 1 : 0;
     return nChannel <= moDataset.GetChanCount() ? nChannel : 0;
 }
 

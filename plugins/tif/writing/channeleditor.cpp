@@ -20,10 +20,8 @@ bool IsSeparate(const TagList& oTags)
     return oTags.GetNumber(TIFFTAG_PLANARCONFIG, PLANARCONFIG_CONTIG) == PLANARCONFIG_SEPARATE;
 }
 
-std::unique_ptr<support::BlockImage> MakeImage(FileEditor& oEditor, const std::shared_ptr<PageModel>& poPage)
+std::unique_ptr<support::BlockImage> MakeImage(std::shared_ptr<PageWriter> poWriter)
 {
-    auto poWriter =
-        std::make_shared<PageWriter>(oEditor.shared_from_this(), poPage, oEditor.OpenPage(poPage), PixelUse::eImage);
     return std::make_unique<support::BlockImage>(std::make_unique<EditedSource>(std::move(poWriter)),
                                                  std::make_shared<support::BlockCache>());
 }
@@ -44,8 +42,9 @@ void ChannelEditor::CheckCodec(const PageModel& oPage, const Place& oPlace) cons
                             oPlace);
 }
 
-void ChannelEditor::Rebuild(const std::shared_ptr<PageModel>& poOld) const
+void ChannelEditor::Rebuild(const std::shared_ptr<PageModel>& poOld, const Place& oPlace) const
 {
+    CheckCodec(*poOld, oPlace);
     moEditor.LoadTags(*poOld);
     const std::shared_ptr<PageModel> poNew = MakePage(*poOld);
     if (IsSeparate(poOld->moTags))
@@ -72,7 +71,7 @@ std::shared_ptr<PageModel> ChannelEditor::MakePage(PageModel& oOld) const
             oTags.SetNumbers(nTag, TIFF_SHORT, std::vector<std::uint64_t>(moSources.size(), oTags.GetNumber(nTag, 1)));
     oTags.SetNumber(TIFFTAG_SAMPLESPERPIXEL, TIFF_SHORT, moSources.size());
     SetColours(oTags, nOldChannels);
-    poNew->SetStriles(poNew->CountStriles());
+    moEditor.LayOut(*poNew);
     return poNew;
 }
 
@@ -103,7 +102,7 @@ void ChannelEditor::SetColours(TagList& oTags, std::uint64_t nOldChannels) const
 }
 
 // Strips and tiles of a channel of its own stay where they are.
-void ChannelEditor::MovePlanes(PageModel& oOld, PageModel& oNew) const
+void ChannelEditor::MovePlanes(const PageModel& oOld, PageModel& oNew) const
 {
     const std::size_t nPlane = oNew.GetStriles() / moSources.size();
     for (std::size_t nChannel = 0; nChannel < moSources.size(); ++nChannel)
@@ -115,14 +114,19 @@ void ChannelEditor::MovePlanes(PageModel& oOld, PageModel& oNew) const
             oNew.moByteCounts[nTo] = oOld.moByteCounts[nFrom];
             oNew.moRoom[nTo] = oOld.moRoom[nFrom];
             oNew.moGenerations[nTo] = oOld.moGenerations[nFrom];
-            oOld.moRoom[nFrom] = 0;
         }
 }
 
 void ChannelEditor::CopyPixels(const std::shared_ptr<PageModel>& poOld, const std::shared_ptr<PageModel>& poNew) const
 {
-    const std::unique_ptr<support::BlockImage> poSource = MakeImage(moEditor, poOld);
-    const std::unique_ptr<support::BlockImage> poTarget = MakeImage(moEditor, poNew);
+    const auto MakeWriter = [this](const std::shared_ptr<PageModel>& poPage)
+    {
+        return std::make_shared<PageWriter>(moEditor.shared_from_this(), poPage, moEditor.OpenPage(poPage),
+                                            PixelUse::eImage);
+    };
+    const std::shared_ptr<PageWriter> poWriter = MakeWriter(poNew);
+    const std::unique_ptr<support::BlockImage> poSource = MakeImage(MakeWriter(poOld));
+    const std::unique_ptr<support::BlockImage> poTarget = MakeImage(poWriter);
     const support::ImageLayout& oLayout = poTarget->GetLayout();
     const support::ChannelSelection oAll(oLayout, Count(moSources.size()));
     const bool bTiled = poOld->IsTiled();
@@ -144,6 +148,7 @@ void ChannelEditor::CopyPixels(const std::shared_ptr<PageModel>& poOld, const st
             FillBlock(*poSource, oRect, oAll.GetValueBytes(), oPixels);
             poTarget->Write(oAll, oRect, oPixels.data(), oRect.mnWidth * oAll.GetPixelBytes());
         }
+    poWriter->Flush();
 }
 
 void ChannelEditor::FillBlock(support::BlockImage& oOld, const support::PixelRect& oRect, std::size_t nValueBytes,

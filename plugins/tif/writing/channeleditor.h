@@ -21,13 +21,13 @@ public:
     }
 
     // Throws DataException for a page whose channels cannot be changed.
-    void CheckCodec(const PageModel& oPage, const Place& oPlace) const;
-    void Rebuild(const std::shared_ptr<PageModel>& poOld) const;
+    void Rebuild(const std::shared_ptr<PageModel>& poOld, const Place& oPlace) const;
 
 private:
+    void CheckCodec(const PageModel& oPage, const Place& oPlace) const;
     std::shared_ptr<PageModel> MakePage(PageModel& oOld) const;
     void SetColours(TagList& oTags, std::uint64_t nOldChannels) const;
-    void MovePlanes(PageModel& oOld, PageModel& oNew) const;
+    void MovePlanes(const PageModel& oOld, PageModel& oNew) const;
     void CopyPixels(const std::shared_ptr<PageModel>& poOld, const std::shared_ptr<PageModel>& poNew) const;
     void FillBlock(support::BlockImage& oOld, const support::PixelRect& oRect, std::size_t nValueBytes,
                    std::vector<unsigned char>& oPixels) const;

@@ -46,7 +46,7 @@ void PlaceDirectory(Placed& oPlaced, const FileHeader& oHeader, std::uint64_t nB
     const std::size_t nWord = oHeader.mbBigTiff ? 8 : 4;
     PageModel& oPage = oPlaced.moPage;
     oPage.moDirectory = oSpace.Allocate(GetDirectoryBytes(oPage, oHeader) + nBehind);
-    for (Tag& oTag : oPage.moTags.GetTags())
+    for (Tag& oTag : oPage.moTags.EditTags())
         if (oTag.GetBytes() > nWord)
             oTag.moStored = oSpace.Allocate(oTag.GetBytes());
     if (oPage.GetStriles() < 2)

@@ -26,18 +26,30 @@ constexpr std::uint64_t FIRST_BLOCK = 16384;
 constexpr std::uint64_t LARGE_BLOCK = 32768;
 constexpr std::uint64_t DIRECTORY_RESERVE = 65536;
 constexpr std::uint64_t MAXIMUM_STRILES = std::uint64_t{1} << 28;
-constexpr std::uint64_t LOADED_TAG_BYTES = 4096;
+// What the structure of an existing file may take in memory: no sound one takes more for each of its bytes.
+constexpr std::uint64_t MODEL_BYTES = std::uint64_t{64} << 20;
+constexpr std::uint64_t MODEL_BYTES_PER_BYTE = 16;
+constexpr std::uint64_t STRILE_MODEL_BYTES = 3 * sizeof(std::uint64_t) + sizeof(std::uint32_t);
+constexpr std::uint64_t LONGEST_LOADED_TEXT = 4096;
 constexpr std::uint64_t MAXIMUM_TAG_BYTES = std::uint64_t{96} << 20;
 constexpr std::size_t COPY_BYTES = std::size_t{1} << 20;
 
-bool IsOffsets(std::uint16_t nTag)
+bool IsStrileTag(std::uint16_t nTag)
 {
-    return nTag == TIFFTAG_STRIPOFFSETS || nTag == TIFFTAG_TILEOFFSETS;
+    return nTag == TIFFTAG_STRIPOFFSETS || nTag == TIFFTAG_TILEOFFSETS || nTag == TIFFTAG_STRIPBYTECOUNTS ||
+           nTag == TIFFTAG_TILEBYTECOUNTS;
 }
 
-bool IsCounts(std::uint16_t nTag)
+// What geometry and role of a page are taken from; the values of other tags stay in the file until they are wanted.
+bool IsNeeded(const Tag& oTag)
 {
-    return nTag == TIFFTAG_STRIPBYTECOUNTS || nTag == TIFFTAG_TILEBYTECOUNTS;
+    constexpr std::uint16_t NEEDED[] = {
+        TIFFTAG_SUBFILETYPE, TIFFTAG_OSUBFILETYPE, TIFFTAG_IMAGEWIDTH,      TIFFTAG_IMAGELENGTH,  TIFFTAG_BITSPERSAMPLE,
+        TIFFTAG_COMPRESSION, TIFFTAG_PHOTOMETRIC,  TIFFTAG_SAMPLESPERPIXEL, TIFFTAG_ROWSPERSTRIP, TIFFTAG_PLANARCONFIG,
+        TIFFTAG_TILEWIDTH,   TIFFTAG_TILELENGTH,   TIFFTAG_SUBIFD,          TIFFTAG_SAMPLEFORMAT};
+    return std::find(std::begin(NEEDED), std::end(NEEDED), oTag.mnTag) != std::end(NEEDED) ||
+           (oTag.mnTag == TIFFTAG_PAGENAME && oTag.mnCount <= LONGEST_PAGE_NAME) ||
+           (oTag.mnTag == TIFFTAG_IMAGEDESCRIPTION && oTag.mnCount <= LONGEST_LOADED_TEXT);
 }
 
 std::uint64_t GetEnd(const Extent& oPiece)
@@ -67,6 +79,51 @@ struct FileEditor::Written
     Extent moCountArray;
 };
 
+FileEditor::Operation::Operation(FileEditor& oEditor)
+    : moEditor(oEditor), mbOuter(!oEditor.mbOperation), mnReleased(oEditor.moReleased.size()),
+      mnModelBytes(oEditor.mnModelBytes), mbChanged(oEditor.mbChanged)
+{
+    if (!mbOuter)
+        return;
+    for (const std::shared_ptr<PageModel>& poPage : oEditor.moPages)
+        moPages.push_back({poPage, poPage->moTags, poPage->moDraft, poPage->mbStrilesChanged});
+    oEditor.mbOperation = true;
+    oEditor.mpoSpace->Begin();
+}
+
+FileEditor::Operation::~Operation()
+{
+    if (!mbOuter || mbAdopted)
+        return;
+    moEditor.moPages.resize(moPages.size());
+    for (std::size_t nAt = 0; nAt < moPages.size(); ++nAt)
+    {
+        Saved& oSaved = moPages[nAt];
+        oSaved.mpoPage->moTags = std::move(oSaved.moTags);
+        oSaved.mpoPage->moDraft = oSaved.moDraft;
+        oSaved.mpoPage->mbStrilesChanged = oSaved.mbStrilesChanged;
+        moEditor.moPages[nAt] = std::move(oSaved.mpoPage);
+    }
+    moEditor.moReleased.resize(mnReleased);
+    moEditor.mnModelBytes = mnModelBytes;
+    moEditor.mbChanged = mbChanged;
+    moEditor.mbOperation = false;
+    moEditor.mpoSpace->Undo();
+}
+
+void FileEditor::Operation::Adopt()
+{
+    mbAdopted = true;
+    if (!mbOuter)
+        return;
+    for (const Saved& oSaved : moPages)
+        oSaved.mpoPage->mbGone = true;
+    for (const std::shared_ptr<PageModel>& poPage : moEditor.moPages)
+        poPage->mbGone = false;
+    moEditor.mbOperation = false;
+    moEditor.mpoSpace->Adopt();
+}
+
 FileEditor::FileEditor(const std::string& fileName)
     : FileEditor(std::make_shared<support::File>(fileName, support::File::Mode::eUpdate), std::nullopt)
 {
@@ -79,6 +136,7 @@ FileEditor::FileEditor(std::shared_ptr<support::File> poFile, const std::optiona
     UseSpace(mpoFile->GetSize());
     mpoSpace->Age(moHeader.mnFirstDirectory);
     mnCommittedSize = mpoFile->GetSize();
+    mnModelBytes = MODEL_BYTES + MODEL_BYTES_PER_BYTE * mnCommittedSize;
     ReadPages();
     FindUnused();
 }
@@ -150,10 +208,11 @@ void FileEditor::ReadPages()
         ReadPage(nOffset, false, nOffset);
     }
     const std::vector<std::uint64_t> oBelow = moPages.front()->moTags.GetNumbers(TIFFTAG_SUBIFD);
+    mbBelowFirst = !oBelow.empty();
     for (const std::uint64_t nOffset : oBelow)
     {
         std::uint64_t nNext = 0;
-        if (nOffset == 0 || !oSeen.insert(nOffset).second)
+        if (nOffset == 0 || !oSeen.insert(nOffset).second || oBelow.size() > MAXIMUM_SUBDIRECTORIES)
             Fail("the directories below its first one cannot be followed; it cannot be updated");
         ReadPage(nOffset, true, nNext);
     }
@@ -165,9 +224,11 @@ void FileEditor::ReadPage(std::uint64_t nOffset, bool bBelowFirst, std::uint64_t
     const RawDirectory oDirectory(oReader, moHeader, nOffset);
     auto poPage = std::make_shared<PageModel>(moHeader.mbBigEndian);
     const std::size_t nWord = moHeader.mbBigTiff ? 8 : 4;
+    Charge(sizeof(PageModel) + oDirectory.GetEntries().size() * sizeof(Tag));
+    std::vector<Tag>& oTags = poPage->moTags.EditTags();
     for (const DirectoryEntry& oEntry : oDirectory.GetEntries())
     {
-        if (IsOffsets(oEntry.mnTag) || IsCounts(oEntry.mnTag))
+        if (IsStrileTag(oEntry.mnTag))
             continue;
         Tag oTag{oEntry.mnTag, oEntry.mnType, oEntry.mnCount, {}, {}};
         if (GetTypeBytes(oEntry.mnType) == 0 || oEntry.GetBytes() > MAXIMUM_TAG_BYTES)
@@ -176,14 +237,19 @@ void FileEditor::ReadPage(std::uint64_t nOffset, bool bBelowFirst, std::uint64_t
             oTag.moStored = {oEntry.mnOffset, oEntry.GetBytes(), 0};
         else
             oTag.moBytes.resize(oEntry.GetBytes());
-        if (oTag.moBytes.size() != oEntry.GetBytes() && oEntry.GetBytes() <= LOADED_TAG_BYTES)
-            Load(oTag);
-        else if (!oTag.moBytes.empty())
+        if (!oTag.moBytes.empty())
             mpoFile->Read(oEntry.mnOffset, oTag.moBytes.data(), oTag.moBytes.size());
-        poPage->moTags.GetTags().push_back(std::move(oTag));
+        oTags.push_back(std::move(oTag));
     }
-    std::stable_sort(poPage->moTags.GetTags().begin(), poPage->moTags.GetTags().end(),
+    // Of a tag that is there twice the first counts, for readers too.
+    std::stable_sort(oTags.begin(), oTags.end(),
                      [](const Tag& oFirst, const Tag& oSecond) { return oFirst.mnTag < oSecond.mnTag; });
+    oTags.erase(std::unique(oTags.begin(), oTags.end(),
+                            [](const Tag& oFirst, const Tag& oSecond) { return oFirst.mnTag == oSecond.mnTag; }),
+                oTags.end());
+    for (Tag& oTag : oTags)
+        if (IsNeeded(oTag))
+            Load(oTag);
     ReadStriles(*poPage, oDirectory);
     poPage->moDirectory = {nOffset, GetDirectoryBytes(oDirectory.GetEntries().size(), moHeader), 0};
     poPage->mnNext = oDirectory.GetNext();
@@ -195,26 +261,24 @@ void FileEditor::ReadPage(std::uint64_t nOffset, bool bBelowFirst, std::uint64_t
 
 void FileEditor::ReadStriles(PageModel& oPage, const RawDirectory& oDirectory)
 {
-    const DirectoryEntry* pOffsets = nullptr;
-    const DirectoryEntry* pCounts = nullptr;
-    for (const DirectoryEntry& oEntry : oDirectory.GetEntries())
-    {
-        if (pOffsets == nullptr && IsOffsets(oEntry.mnTag))
-            pOffsets = &oEntry;
-        if (pCounts == nullptr && IsCounts(oEntry.mnTag))
-            pCounts = &oEntry;
-    }
+    const StrileEntries oEntries(oDirectory);
+    const DirectoryEntry* pOffsets = oEntries.mpOffsets;
+    const DirectoryEntry* pCounts = oEntries.mpByteCounts;
     const std::uint64_t nStriles = oPage.CountStriles();
     if (pOffsets == nullptr || pCounts == nullptr || pOffsets->mnCount < nStriles || pCounts->mnCount < nStriles)
         Fail("a directory does not say where all strips or tiles lie and how long they are; it cannot be updated");
     if (nStriles > MAXIMUM_STRILES)
         Fail("there are too many strips or tiles to be updated");
+    Charge(nStriles * STRILE_MODEL_BYTES);
     oPage.SetStriles(nStriles);
     const std::size_t nWord = moHeader.mbBigTiff ? 8 : 4;
-    oPage.moOffsets = ReadArray(*pOffsets);
-    oPage.moByteCounts = ReadArray(*pCounts);
-    oPage.moOffsets.resize(nStriles);
-    oPage.moByteCounts.resize(nStriles);
+    StrileArray oOffsets(*mpoFile, *pOffsets, moHeader.mbBigEndian);
+    StrileArray oCounts(*mpoFile, *pCounts, moHeader.mbBigEndian);
+    for (std::uint64_t nAt = 0; nAt < nStriles; ++nAt)
+    {
+        oPage.moOffsets[nAt] = oOffsets.Get(*mpoFile, nAt);
+        oPage.moByteCounts[nAt] = oCounts.Get(*mpoFile, nAt);
+    }
     oPage.moRoom = oPage.moByteCounts;
     // What is added to the file would otherwise be taken for what is missing.
     for (std::uint64_t nAt = 0; nAt < nStriles; ++nAt)
@@ -232,17 +296,12 @@ void FileEditor::ReadStriles(PageModel& oPage, const RawDirectory& oDirectory)
                           pCounts->mnCount != nStriles;
 }
 
-std::vector<std::uint64_t> FileEditor::ReadArray(const DirectoryEntry& oEntry)
+// Pages that share or overlap what they are made of claim more than the file holds.
+void FileEditor::Charge(std::uint64_t nBytes)
 {
-    const std::size_t nValueBytes = GetTypeBytes(oEntry.mnType);
-    if (nValueBytes == 0 || oEntry.GetBytes() > mpoFile->GetSize())
-        Fail("the list of its strips or tiles is longer than the file");
-    std::vector<unsigned char> oBytes(oEntry.GetBytes());
-    mpoFile->Read(oEntry.mnOffset, oBytes.data(), oBytes.size());
-    std::vector<std::uint64_t> oValues(oEntry.mnCount);
-    for (std::size_t nAt = 0; nAt < oValues.size(); ++nAt)
-        oValues[nAt] = ReadNumber(oBytes.data() + nAt * nValueBytes, nValueBytes, moHeader.mbBigEndian);
-    return oValues;
+    if (nBytes > mnModelBytes)
+        Fail("its directories claim far more than the file holds; it cannot be updated");
+    mnModelBytes -= nBytes;
 }
 
 void FileEditor::Load(Tag& oTag)
@@ -251,13 +310,14 @@ void FileEditor::Load(Tag& oTag)
         return;
     if (oTag.moStored.mnOffset > mpoFile->GetSize() || oTag.GetBytes() > mpoFile->GetSize() - oTag.moStored.mnOffset)
         Fail("the file is truncated: tag " + std::to_string(oTag.mnTag) + " lies behind its end");
+    Charge(oTag.GetBytes());
     oTag.moBytes.resize(oTag.GetBytes());
     mpoFile->Read(oTag.moStored.mnOffset, oTag.moBytes.data(), oTag.moBytes.size());
 }
 
 void FileEditor::LoadTags(PageModel& oPage)
 {
-    for (Tag& oTag : oPage.moTags.GetTags())
+    for (Tag& oTag : oPage.moTags.EditTags())
         Load(oTag);
 }
 
@@ -353,6 +413,16 @@ std::optional<std::uint64_t> FileEditor::CountUnusedBytes(std::shared_ptr<suppor
     return FileEditor(std::move(poFile), oHeader).GetUnusedBytes();
 }
 
+void FileEditor::Restart() noexcept
+{
+    moPages.clear();
+    moWriters.clear();
+    mpoFile.reset();
+    if (!moTemporary.empty())
+        std::remove(moTemporary.c_str());
+    moTemporary.clear();
+}
+
 void FileEditor::CreateFile(bool bBigTiff, bool bGap)
 {
     const std::string temporary = support::MakeTemporaryName(moFileName);
@@ -373,14 +443,21 @@ void FileEditor::UseSpace(std::uint64_t nEnd)
                                                 "BigTIFF (option BIGTIFF=YES)");
 }
 
+void FileEditor::LayOut(PageModel& oPage, const Place& oPlace) const
+{
+    const std::uint64_t nStriles = oPage.CountStriles();
+    if (nStriles > MAXIMUM_STRILES)
+        throw DataException(moFileName + ": the image would have " + std::to_string(nStriles) +
+                                " strips or tiles; choose larger ones (options BLOCKXSIZE, BLOCKYSIZE)",
+                            oPlace);
+    oPage.SetStriles(nStriles);
+}
+
 std::shared_ptr<PageModel> FileEditor::AddFirstPage(const NewImage& oImage, const Place& oPlace)
 {
     CheckWritable(oPlace);
     std::shared_ptr<PageModel> poPage = MakeImagePage(oImage, moOptions, false, oPlace);
-    if (poPage->GetStriles() > MAXIMUM_STRILES)
-        throw DataException(moFileName + ": the image would have " + std::to_string(poPage->GetStriles()) +
-                                " strips or tiles; choose larger ones (options BLOCKXSIZE, BLOCKYSIZE)",
-                            oPlace);
+    LayOut(*poPage, oPlace);
     const std::uint64_t nPixelBytes = oImage.moType.GetValueBits() / 8 * oImage.mnChannels;
     const std::uint64_t nPixels = std::uint64_t{oImage.mnWidth} * oImage.mnHeight;
     const std::uint64_t nBytes = nPixels > INT64_MAX / nPixelBytes ? INT64_MAX : nPixels * nPixelBytes;
@@ -399,6 +476,8 @@ std::shared_ptr<PageModel> FileEditor::AddFirstPage(const NewImage& oImage, cons
 void FileEditor::AddPage(std::shared_ptr<PageModel> poPage)
 {
     CheckWritable();
+    if (poPage->moOffsets.empty())
+        LayOut(*poPage);
     poPage->mnNumber = mnNextNumber++;
     poPage->mbStrilesChanged = true;
     const auto oBelow = std::find_if(moPages.begin(), moPages.end(),
@@ -407,24 +486,28 @@ void FileEditor::AddPage(std::shared_ptr<PageModel> poPage)
     mbChanged = true;
 }
 
-void FileEditor::ReleaseStriles(const PageModel& oPage)
+void FileEditor::ReleasePage(const PageModel& oPage, const PageModel* pHeir)
 {
+    std::unordered_set<std::uint64_t> oKept;
+    for (std::size_t nAt = 0; pHeir != nullptr && nAt < pHeir->moOffsets.size(); ++nAt)
+        if (pHeir->moRoom[nAt] != 0)
+            oKept.insert(pHeir->moOffsets[nAt]);
     for (std::size_t nAt = 0; nAt < oPage.moOffsets.size(); ++nAt)
-        if (oPage.moRoom[nAt] != 0)
+        if (oPage.moRoom[nAt] != 0 && !oKept.contains(oPage.moOffsets[nAt]))
             moReleased.push_back({oPage.moOffsets[nAt], oPage.moRoom[nAt], oPage.moGenerations[nAt]});
     for (const Extent& oExtent : {oPage.moDirectory, oPage.moDraft, oPage.moOffsetArray, oPage.moCountArray})
         if (oExtent.mnBytes != 0)
             moReleased.push_back(oExtent);
+    for (const Tag& oTag : oPage.moTags.GetTags())
+        if (oTag.moStored.mnBytes != 0)
+            moReleased.push_back(oTag.moStored);
 }
 
 void FileEditor::RemovePage(std::uint64_t nNumber)
 {
     CheckWritable();
     const std::shared_ptr<PageModel> poPage = GetPage(nNumber);
-    ReleaseStriles(*poPage);
-    for (const Tag& oTag : poPage->moTags.GetTags())
-        if (oTag.moStored.mnBytes != 0)
-            moReleased.push_back(oTag.moStored);
+    ReleasePage(*poPage, nullptr);
     moPages.erase(std::find(moPages.begin(), moPages.end(), poPage));
     if (poPage->mbBelowFirst)
         moPages.front()->moTags.Touch();
@@ -435,10 +518,7 @@ void FileEditor::ReplacePage(std::shared_ptr<PageModel> poPage)
 {
     CheckWritable();
     const std::shared_ptr<PageModel> poOld = GetPage(poPage->mnNumber);
-    ReleaseStriles(*poOld);
-    for (const Tag& oTag : poOld->moTags.GetTags())
-        if (oTag.moStored.mnBytes != 0)
-            moReleased.push_back(oTag.moStored);
+    ReleasePage(*poOld, poPage.get());
     poPage->mbBelowFirst = poOld->mbBelowFirst;
     poPage->mnNext = poOld->mnNext;
     poPage->mbStrilesChanged = true;
@@ -549,8 +629,7 @@ FileEditor::Written FileEditor::WriteDirectory(PageModel& oPage, std::uint64_t n
     WriteArray(oPage.moOffsets, oWritten.moOffsetArray);
     WriteArray(oPage.moByteCounts, oWritten.moCountArray);
 
-    std::vector<Tag>& oTags = oPage.moTags.GetTags();
-    for (Tag& oTag : oTags)
+    for (Tag& oTag : oPage.moTags.EditTags())
         if (oTag.GetBytes() > nWord && oTag.moStored.mnBytes == 0)
         {
             Extent oPlace = mpoSpace->Allocate(oTag.GetBytes());
@@ -586,6 +665,12 @@ std::shared_ptr<Page> FileEditor::OpenPage(const std::shared_ptr<PageModel>& poP
         nOffset = poPage->moDraft.mnOffset;
     }
     auto poOpened = std::make_shared<Page>(mpoFile, moHeader, nOffset);
+    const PageForm& oForm = poOpened->GetForm();
+    const PageSummary oSummary = poPage->Summarise();
+    if (oForm.mnWidth != oSummary.mnWidth || oForm.mnHeight != oSummary.mnHeight ||
+        oForm.mnChannels != oSummary.mnChannels || oForm.moSample.GetBits() != oSummary.mnBits ||
+        oForm.mbTiled != poPage->IsTiled() || oForm.GetStriles() != poPage->GetStriles())
+        Fail("a directory contradicts itself about the size of the image; it cannot be updated");
     poOpened->GetStriles().Use(poPage);
     return poOpened;
 }
@@ -612,10 +697,10 @@ std::vector<FileEditor::Written> FileEditor::WriteDirectories()
                                                      : poPage->moDirectory.mnOffset);
             }
         TagList& oTags = moPages.front()->moTags;
-        if (oBelow.empty())
+        if (oBelow.empty() && mbBelowFirst)
             oTags.Remove(TIFFTAG_SUBIFD);
-        else if (oBelow != oTags.GetNumbers(TIFFTAG_SUBIFD))
-            oTags.SetNumbers(TIFFTAG_SUBIFD, oTags.Find(TIFFTAG_SUBIFD)->mnType, oBelow);
+        else if (oBelow != oTags.GetNumbers(TIFFTAG_SUBIFD) && mbBelowFirst)
+            oTags.SetNumbers(TIFFTAG_SUBIFD, moHeader.mbBigTiff ? TIFF_IFD8 : TIFF_IFD, oBelow);
 
         std::uint64_t nNext = 0;
         for (std::size_t nAt = moPages.size() - oBelow.size(); nAt-- > 0;)
@@ -696,9 +781,25 @@ void FileEditor::Finish()
     mbNamed = true;
 }
 
+// Pages that came and went again leave nothing to be written.
+void FileEditor::Commit(const std::vector<Written>& oWritten)
+{
+    if (!oWritten.empty())
+        Publish(oWritten);
+    for (const std::shared_ptr<PageModel>& poPage : moPages)
+        for (const Extent& oExtent : poPage->moTags.TakeReleased())
+            mpoSpace->Release(oExtent);
+    for (const Extent& oExtent : std::exchange(moReleased, {}))
+        mpoSpace->Release(oExtent);
+    mbChanged = false;
+    // Nobody reads what has no name yet.
+    if (!oWritten.empty())
+        mpoSpace->Reuse(moTemporary.empty() ? mpoFile->FindHeld() : support::Space::Roots(std::in_place));
+}
+
 // What was written reaches the disk before the one number that makes it the file's, and that before anything of the
 // former state is given up.
-void FileEditor::Commit(const std::vector<Written>& oWritten)
+void FileEditor::Publish(const std::vector<Written>& oWritten)
 {
     const Written& oFirst = oWritten.back();
     const bool bFirst = oFirst.mpPage == moPages.front().get();
@@ -723,14 +824,6 @@ void FileEditor::Commit(const std::vector<Written>& oWritten)
 
     for (const Written& oDirectory : oWritten)
         Adopt(oDirectory);
-    for (const std::shared_ptr<PageModel>& poPage : moPages)
-        for (const Extent& oExtent : poPage->moTags.TakeReleased())
-            mpoSpace->Release(oExtent);
-    for (const Extent& oExtent : std::exchange(moReleased, {}))
-        mpoSpace->Release(oExtent);
-    mbChanged = false;
-    // Nobody reads what has no name yet.
-    mpoSpace->Reuse(bNew ? support::Space::Roots(std::in_place) : mpoFile->FindHeld());
 }
 
 void FileEditor::Adopt(const Written& oWritten)

@@ -25,6 +25,8 @@ class PageWriter;
 class FileEditor : public std::enable_shared_from_this<FileEditor>
 {
 public:
+    class Operation;
+
     // For an existing file. Throws the kinds of FileException, for files that cannot be updated too.
     explicit FileEditor(const std::string& fileName);
     // For a new file, which is made by AddFirstPage.
@@ -51,12 +53,18 @@ public:
 
     // Lays a new file out. Decides between classic and big.
     std::shared_ptr<PageModel> AddFirstPage(const NewImage& oImage, const Place& oPlace);
+    // A page that nothing of is stored. Throws DataException when it has too many strips or tiles.
     void AddPage(std::shared_ptr<PageModel> poPage);
+    // Back to before AddFirstPage.
+    void Restart() noexcept;
+    // The lists of strips and tiles for a page's tags, of nothing stored. Throws DataException when there are too many.
+    void LayOut(PageModel& oPage, const Place& oPlace = Place::Current()) const;
     void RemovePage(std::uint64_t nNumber);
-    // Puts other pages in the place of pages with the same numbers.
+    // Puts a page in the place of the one with its number, of which it may have taken over strips and tiles.
     void ReplacePage(std::shared_ptr<PageModel> poPage);
 
-    // The page as readers see it, with the tags of this moment.
+    // The page as readers see it, with the tags of this moment. Throws FileFormatException for one that cannot be read
+    // so, or that readers see in another size.
     std::shared_ptr<Page> OpenPage(const std::shared_ptr<PageModel>& poPage);
     // Brings the values of a tag into memory, and all of a page.
     void Load(Tag& oTag);
@@ -100,7 +108,8 @@ private:
     bool SharesOwn(const std::vector<Extent>& oPieces) const;
     void ReadPage(std::uint64_t nOffset, bool bBelowFirst, std::uint64_t& nNext);
     void ReadStriles(PageModel& oPage, const RawDirectory& oDirectory);
-    std::vector<std::uint64_t> ReadArray(const DirectoryEntry& oEntry);
+    // Counts what the structure takes in memory. Throws FileFormatException when it is more than a sound file's.
+    void Charge(std::uint64_t nBytes);
     void CreateFile(bool bBigTiff, bool bGap);
     void UseSpace(std::uint64_t nEnd);
     std::uint64_t GetReserve() const;
@@ -110,9 +119,11 @@ private:
     Written WriteDirectory(PageModel& oPage, std::uint64_t nNext, bool bDraft);
     std::vector<Written> WriteDirectories();
     void Commit(const std::vector<Written>& oWritten);
+    void Publish(const std::vector<Written>& oWritten);
     void ReleaseWritten(const std::vector<Written>& oWritten);
     void Adopt(const Written& oWritten);
-    void ReleaseStriles(const PageModel& oPage);
+    // pHeir: the page that takes its place, or null.
+    void ReleasePage(const PageModel& oPage, const PageModel* pHeir);
     [[noreturn]] void Fail(const std::string& what, const Place& oPlace = Place::Current()) const;
 
     std::string moFileName;
@@ -124,12 +135,46 @@ private:
     std::vector<std::shared_ptr<PageModel>> moPages;
     std::vector<std::weak_ptr<PageWriter>> moWriters;
     std::uint64_t mnNextNumber = 1;
-    std::uint64_t mnCommittedSize = 0; // of the file with all that its committed state may use
-    std::vector<Extent> moReleased;    // of pages that are gone
-    RoomRecord moRecord;               // that goes with the next state
-    bool mbChanged = false;            // pages came or went
+    std::uint64_t mnModelBytes = UINT64_MAX; // that the structure may still take
+    std::uint64_t mnCommittedSize = 0;       // of the file with all that its committed state may use
+    std::vector<Extent> moReleased;          // of pages that are gone
+    RoomRecord moRecord;                     // that goes with the next state
+    bool mbChanged = false;                  // pages came or went
+    bool mbBelowFirst = false;               // the first page listed others when the file was opened
+    bool mbOperation = false;                // one is under way
     bool mbEnded = false;
     bool mbNamed = true;
+};
+
+// An operation on the structure of a file: pages that come, go or get other tags. All of it is undone, in memory and in
+// the room that it took, when it is not adopted. One that begins within another is a part of that one. Pixels of pages
+// that were there before must not be stored meanwhile.
+class FileEditor::Operation
+{
+public:
+    explicit Operation(FileEditor& oEditor);
+    ~Operation();
+    Operation(const Operation&) = delete;
+    Operation& operator=(const Operation&) = delete;
+
+    void Adopt();
+
+private:
+    struct Saved
+    {
+        std::shared_ptr<PageModel> mpoPage;
+        TagList moTags;
+        Extent moDraft;
+        bool mbStrilesChanged;
+    };
+
+    FileEditor& moEditor;
+    bool mbOuter;
+    bool mbAdopted = false;
+    std::vector<Saved> moPages;
+    std::size_t mnReleased;
+    std::uint64_t mnModelBytes;
+    bool mbChanged;
 };
 
 } // namespace krv::plugins::tif

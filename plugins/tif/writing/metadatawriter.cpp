@@ -135,21 +135,21 @@ bool MetadataWriter::StoreInTag(const std::string& key, const std::string& value
 {
     for (const TextTag& oText : TEXTS)
         if (IsSameKey(key, oText.mpKey))
-            return StoreText(oText.mnTag, value);
+            return StoreText(oText.mnTag, value) && key == oText.mpKey; // else an item says how it is written
     if (IsSameKey(key, "XResolution"))
-        return StoreResolution(TIFFTAG_XRESOLUTION, value);
+        return StoreResolution(TIFFTAG_XRESOLUTION, value) && key == "XResolution";
     if (IsSameKey(key, "YResolution"))
-        return StoreResolution(TIFFTAG_YRESOLUTION, value);
+        return StoreResolution(TIFFTAG_YRESOLUTION, value) && key == "YResolution";
     if (IsSameKey(key, "Orientation"))
-        return StoreNumber(TIFFTAG_ORIENTATION, value, 2, 8);
+        return StoreNumber(TIFFTAG_ORIENTATION, value, 2, 8) && key == "Orientation";
     if (IsSameKey(key, "Photometric"))
-        return StorePhotometric(value);
+        return StorePhotometric(value) && key == "Photometric";
     if (IsSameKey(key, "RasterType"))
-        return StoreRasterType(value);
+        return StoreRasterType(value) && key == "RasterType";
     if (IsSameKey(key, "RPC"))
-        return StoreRpc(value);
+        return StoreRpc(value) && key == "RPC";
     if (IsSameKey(key, "GroundControlPoints"))
-        return StorePoints(value);
+        return StorePoints(value) && key == "GroundControlPoints";
     return false;
 }
 

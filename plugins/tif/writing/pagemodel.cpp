@@ -195,7 +195,9 @@ PageSummary PageModel::Summarise() const
     // One that is not in memory is long.
     oPage.mbDescribed = pText != nullptr && pText->mnType == TIFF_ASCII && pText->mnCount != 0 &&
                         (pText->moBytes.empty() || pText->moBytes.front() != 0);
-    oPage.mnNumber = ParsePageName(moTags.GetText(TIFFTAG_PAGENAME), oPage.mbReduced);
+    const Tag* pName = moTags.Find(TIFFTAG_PAGENAME);
+    if (pName != nullptr && pName->mnType == TIFF_ASCII && pName->mnCount <= LONGEST_PAGE_NAME)
+        oPage.mnNumber = ParsePageName(moTags.GetText(TIFFTAG_PAGENAME), oPage.mbReduced);
     return oPage;
 }
 
@@ -218,7 +220,6 @@ std::shared_ptr<PageModel> MakeImagePage(const NewImage& oImage, const CreateOpt
     const std::uint16_t nPredictor = ChoosePredictor(oImage, oOptions, oPlace);
     if (nPredictor != PREDICTOR_NONE)
         oTags.SetNumber(TIFFTAG_PREDICTOR, TIFF_SHORT, nPredictor);
-    poPage->SetStriles(poPage->CountStriles());
     return poPage;
 }
 
@@ -239,8 +240,6 @@ std::shared_ptr<PageModel> MakeReducedPage(const PageModel& oFull, std::uint32_t
     const std::uint64_t nCompression = oTags.GetNumber(TIFFTAG_COMPRESSION, COMPRESSION_NONE);
     if (nCompression >= COMPRESSION_CCITTRLE && nCompression <= COMPRESSION_CCITTFAX4)
         oTags.SetNumber(TIFFTAG_COMPRESSION, TIFF_SHORT, COMPRESSION_ADOBE_DEFLATE); // facsimile is only read
-    const std::uint64_t nKind = oFull.moTags.GetNumber(TIFFTAG_SUBFILETYPE, 0);
-    oTags.SetNumber(TIFFTAG_SUBFILETYPE, TIFF_LONG, nKind | FILETYPE_REDUCEDIMAGE);
     oTags.SetNumber(TIFFTAG_IMAGEWIDTH, TIFF_LONG, nWidth);
     oTags.SetNumber(TIFFTAG_IMAGELENGTH, TIFF_LONG, nHeight);
     if (oFull.IsTiled())
@@ -249,7 +248,6 @@ std::shared_ptr<PageModel> MakeReducedPage(const PageModel& oFull, std::uint32_t
     else
         oTags.SetNumber(TIFFTAG_ROWSPERSTRIP, TIFF_LONG,
                         std::min<std::uint64_t>(oFull.moTags.GetNumber(TIFFTAG_ROWSPERSTRIP, UINT32_MAX), nHeight));
-    poPage->SetStriles(poPage->CountStriles());
     return poPage;
 }
 
@@ -286,7 +284,6 @@ std::shared_ptr<PageModel> MakeBitmapPage(const PageModel& oImage, unsigned int 
         oTags.SetNumber(TIFFTAG_ROWSPERSTRIP, TIFF_LONG,
                         std::min<std::uint64_t>(oImage.moTags.GetNumber(TIFFTAG_ROWSPERSTRIP, UINT32_MAX), nHeight));
     SetBitmapKind(*poPage, nBitmap, MakePageName(nBitmap, false));
-    poPage->SetStriles(poPage->CountStriles());
     return poPage;
 }
 

@@ -42,6 +42,7 @@ public:
     bool mbStrilesChanged = false;
     bool mbArraysStale = false; // the arrays in the file are of other types than are written here
     bool mbBelowFirst = false;  // listed by the first page, not in the chain
+    bool mbGone = false;        // no page of the file any more
 
     // In the file: the directory that belongs to the committed state, one written ahead for reading, and the arrays.
     Extent moDirectory;
@@ -59,6 +60,8 @@ struct NewImage
     std::uint16_t mnChannels = 1;
     krv::gobs::DataType moType;
 };
+
+// Pages without lists of strips and tiles: FileEditor lays those out.
 
 // The page of a new image. Throws DataException for a type or a codec that do not go together.
 std::shared_ptr<PageModel> MakeImagePage(const NewImage& oImage, const CreateOptions& oOptions, bool bBigEndian,

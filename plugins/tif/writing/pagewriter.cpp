@@ -77,6 +77,7 @@ support::PixelRect PageWriter::ToImage(const support::BlockAddress& oBlock, cons
 void PageWriter::Read(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
                       std::size_t nPitch)
 {
+    CheckPage();
     moReader.ReadBlock(oBlock, oPart, pTarget, nPitch);
     if (moHeld.empty())
         return;
@@ -102,9 +103,14 @@ void PageWriter::Write(const support::BlockAddress& oBlock, const support::Pixel
                        const unsigned char* pSource, std::size_t nPitch)
 {
     mpoEditor->CheckWritable();
+    CheckPage();
     moEncoder.CheckWritable();
     if (moOnChange)
-        std::exchange(moOnChange, nullptr)();
+    {
+        const auto oCall = moOnChange;
+        oCall();
+        moOnChange = nullptr;
+    }
     const support::PixelRect oRect = ToImage(oBlock, oPart);
     ForEach(oBlock.mnPlane, oRect,
             [&](const Strile& oStrile)
@@ -232,8 +238,21 @@ void PageWriter::Forget(std::uint64_t nStrile)
     moIndex.erase(oFound);
 }
 
+// The room of a page that was deleted or replaced may hold something else by now.
+void PageWriter::CheckPage() const
+{
+    if (mpoModel->mbGone)
+        throw DataException(GetName() + ": the page of these pixels is no longer there");
+}
+
 void PageWriter::Flush()
 {
+    if (mpoModel->mbGone)
+    {
+        moHeld.clear();
+        moIndex.clear();
+        mnHeldBytes = 0;
+    }
     while (!moHeld.empty())
         StoreOldest();
 }

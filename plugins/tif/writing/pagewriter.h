@@ -36,10 +36,10 @@ public:
               std::size_t nPitch);
     void Write(const support::BlockAddress& oBlock, const support::PixelRect& oPart, const unsigned char* pSource,
                std::size_t nPitch);
-    // Stores what is held back.
+    // Stores what is held back, as long as the page is there.
     void Flush();
 
-    // Called before the first change after it is set.
+    // Called before the first change after it is set, and again as long as it throws.
     void OnChange(std::function<void()> oCall) { moOnChange = std::move(oCall); }
 
 private:
@@ -71,6 +71,7 @@ private:
     void ReadStored(const Strile& oStrile, unsigned char* pTarget, std::size_t nPitch);
     void StoreOldest();
     void Forget(std::uint64_t nStrile);
+    void CheckPage() const;
     std::size_t GetPixelBytes() const { return GetLayout().GetPixelBytes(0); }
 
     std::shared_ptr<FileEditor> mpoEditor;
@@ -108,6 +109,7 @@ public:
         mpoWriter->Write(oBlock, oPart, pSource, nPitch);
     }
     std::string GetName() const override { return mpoWriter->GetName(); }
+    const std::shared_ptr<PageWriter>& GetWriter() const { return mpoWriter; }
 
 private:
     std::shared_ptr<PageWriter> mpoWriter;

@@ -15,16 +15,24 @@ void AppendNumber(std::vector<unsigned char>& oBytes, std::uint64_t nValue, std:
         oBytes.push_back(static_cast<unsigned char>(nValue >> 8 * (bBigEndian ? nBytes - 1 - nAt : nAt)));
 }
 
-std::vector<Tag>::iterator TagList::Position(std::uint16_t nTag)
+std::vector<Tag>& TagList::EditTags()
 {
-    return std::lower_bound(moTags.begin(), moTags.end(), nTag,
-                            [](const Tag& oTag, std::uint16_t nNumber) { return oTag.mnTag < nNumber; });
+    if (mpoTags.use_count() > 1)
+        mpoTags = std::make_shared<std::vector<Tag>>(*mpoTags);
+    return *mpoTags;
+}
+
+std::size_t TagList::Position(std::uint16_t nTag) const
+{
+    const auto oFound = std::lower_bound(mpoTags->begin(), mpoTags->end(), nTag,
+                                         [](const Tag& oTag, std::uint16_t nNumber) { return oTag.mnTag < nNumber; });
+    return static_cast<std::size_t>(oFound - mpoTags->begin());
 }
 
 const Tag* TagList::Find(std::uint16_t nTag) const
 {
-    const auto oFound = const_cast<TagList*>(this)->Position(nTag);
-    return oFound != moTags.end() && oFound->mnTag == nTag ? &*oFound : nullptr;
+    const std::size_t nAt = Position(nTag);
+    return nAt < mpoTags->size() && (*mpoTags)[nAt].mnTag == nTag ? &(*mpoTags)[nAt] : nullptr;
 }
 
 std::vector<std::uint64_t> TagList::GetNumbers(std::uint16_t nTag) const
@@ -32,8 +40,7 @@ std::vector<std::uint64_t> TagList::GetNumbers(std::uint16_t nTag) const
     std::vector<std::uint64_t> oNumbers;
     const Tag* pTag = Find(nTag);
     const std::size_t nBytes = pTag == nullptr ? 0 : GetTypeBytes(pTag->mnType);
-    const bool bWhole = pTag != nullptr && pTag->mnType != TIFF_ASCII && pTag->mnType != TIFF_RATIONAL &&
-                        pTag->mnType != TIFF_SRATIONAL && pTag->mnType != TIFF_FLOAT && pTag->mnType != TIFF_DOUBLE;
+    const bool bWhole = pTag != nullptr && IsWholeType(pTag->mnType);
     for (std::size_t nAt = 0; bWhole && nBytes != 0 && nAt + nBytes <= pTag->moBytes.size(); nAt += nBytes)
         oNumbers.push_back(ReadNumber(pTag->moBytes.data() + nAt, nBytes, mbBigEndian));
     return oNumbers;
@@ -57,15 +64,16 @@ std::string TagList::GetText(std::uint16_t nTag) const
 void TagList::Set(Tag oTag)
 {
     mbChanged = true;
-    const auto oAt = Position(oTag.mnTag);
-    if (oAt == moTags.end() || oAt->mnTag != oTag.mnTag)
+    std::vector<Tag>& oTags = EditTags();
+    const std::size_t nAt = Position(oTag.mnTag);
+    if (Find(oTag.mnTag) == nullptr)
     {
-        moTags.insert(oAt, std::move(oTag));
+        oTags.insert(oTags.begin() + static_cast<std::ptrdiff_t>(nAt), std::move(oTag));
         return;
     }
-    if (oAt->moStored.mnBytes != 0)
-        moReleased.push_back(oAt->moStored);
-    *oAt = std::move(oTag);
+    if (oTags[nAt].moStored.mnBytes != 0)
+        moReleased.push_back(oTags[nAt].moStored);
+    oTags[nAt] = std::move(oTag);
 }
 
 void TagList::SetNumbers(std::uint16_t nTag, std::uint16_t nType, const std::vector<std::uint64_t>& oValues)
@@ -103,12 +111,13 @@ void TagList::SetBytes(std::uint16_t nTag, std::uint16_t nType, const std::strin
 
 void TagList::Remove(std::uint16_t nTag)
 {
-    const auto oAt = Position(nTag);
-    if (oAt == moTags.end() || oAt->mnTag != nTag)
+    if (Find(nTag) == nullptr)
         return;
+    std::vector<Tag>& oTags = EditTags();
+    const auto oAt = oTags.begin() + static_cast<std::ptrdiff_t>(Position(nTag));
     if (oAt->moStored.mnBytes != 0)
         moReleased.push_back(oAt->moStored);
-    moTags.erase(oAt);
+    oTags.erase(oAt);
     mbChanged = true;
 }
 

@@ -5,6 +5,7 @@
 #include "plugins/tif/rawdirectory.h"
 
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -26,14 +27,14 @@ struct Tag
 };
 
 // The tags of a directory, ascending, all but those that say where strips and tiles lie. Tags that nobody asks about
-// are kept byte for byte.
+// are kept byte for byte. Copies share their tags until one of them changes.
 class TagList
 {
 public:
     explicit TagList(bool bBigEndian) : mbBigEndian(bBigEndian) {}
 
-    const std::vector<Tag>& GetTags() const { return moTags; }
-    std::vector<Tag>& GetTags() { return moTags; }
+    const std::vector<Tag>& GetTags() const { return *mpoTags; }
+    std::vector<Tag>& EditTags();
     bool IsBigEndian() const { return mbBigEndian; }
     const Tag* Find(std::uint16_t nTag) const;
 
@@ -61,11 +62,11 @@ public:
     void Touch() { mbChanged = true; }
 
 private:
-    std::vector<Tag>::iterator Position(std::uint16_t nTag);
+    std::size_t Position(std::uint16_t nTag) const;
 
     bool mbBigEndian;
     bool mbChanged = false;
-    std::vector<Tag> moTags;
+    std::shared_ptr<std::vector<Tag>> mpoTags = std::make_shared<std::vector<Tag>>();
     std::vector<Extent> moReleased;
 };
 

@@ -8,6 +8,7 @@
 #include "plugins/tif/tifdataset.h"
 #include "tools/conformance/tempfolder.h"
 
+#include <algorithm>
 #include <cstdint>
 #include <memory>
 #include <random>
@@ -60,6 +61,64 @@ struct Judgement
     std::string moComplaints;
 };
 Judgement Judge(const std::string& fileName, unsigned int nDirectory = 0);
+
+inline void WriteBytes(const std::string& fileName, const Bytes& oBytes)
+{
+    WriteFile(fileName, {oBytes.begin(), oBytes.end()});
+}
+
+// A little-endian classic file put together entry by entry.
+class Handmade
+{
+public:
+    void Add(std::uint16_t nTag, std::uint16_t nType, std::uint32_t nCount, std::uint32_t nValue)
+    {
+        Put(nTag, 2);
+        Put(nType, 2);
+        Put(nCount, 4);
+        Put(nValue, 4);
+        ++mnEntries;
+    }
+
+    Bytes Finish(std::uint32_t nNext = 0, std::size_t nSize = 0) const
+    {
+        Bytes oFile = {'I', 'I', 42, 0, 8, 0, 0, 0, static_cast<unsigned char>(mnEntries), 0};
+        oFile.insert(oFile.end(), moEntries.begin(), moEntries.end());
+        for (int nByte = 0; nByte < 4; ++nByte)
+            oFile.push_back(static_cast<unsigned char>(nNext >> (8 * nByte)));
+        oFile.resize(std::max(nSize, oFile.size()));
+        return oFile;
+    }
+
+    // One channel of 8 bits in strips.
+    static Handmade Image(std::uint32_t nWidth, std::uint32_t nHeight, std::uint32_t nRowsPerStrip,
+                          std::uint16_t nCompression, std::uint32_t nStrips, std::uint32_t nOffset,
+                          std::uint32_t nBytes, std::uint16_t nBits = 8, std::uint16_t nPhotometric = 1,
+                          std::uint16_t nChannels = 1)
+    {
+        Handmade oFile;
+        oFile.Add(256, 4, 1, nWidth);
+        oFile.Add(257, 4, 1, nHeight);
+        oFile.Add(258, 3, 1, nBits);
+        oFile.Add(259, 3, 1, nCompression);
+        oFile.Add(262, 3, 1, nPhotometric);
+        oFile.Add(273, 4, nStrips, nOffset);
+        oFile.Add(277, 3, 1, nChannels);
+        oFile.Add(278, 4, 1, nRowsPerStrip);
+        oFile.Add(279, 4, nStrips, nBytes);
+        return oFile;
+    }
+
+private:
+    void Put(std::uint32_t nValue, int nBytes)
+    {
+        for (int nByte = 0; nByte < nBytes; ++nByte)
+            moEntries.push_back(static_cast<unsigned char>(nValue >> (8 * nByte)));
+    }
+
+    Bytes moEntries;
+    unsigned int mnEntries = 0;
+};
 
 // Names in a folder.
 std::vector<std::string> ListFolder(const std::string& folder);

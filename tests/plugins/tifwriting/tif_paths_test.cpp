@@ -337,4 +337,232 @@ TEST(TifPaths, AClassicFileThatIsFullAndAFileThatIsOnlyReadSaySo)
     EXPECT_EQ(ReadFile(fileName), before);
 }
 
+TEST(TifPaths, PagesThatComeAndGoLeaveNothingBehind)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("pages.tif");
+    CreateTif(fileName, "", 40, 30, 1, krv::gobs::eDT_8U)->Close();
+    TifPointer poDataset = OpenTif(fileName, eUpdate);
+    poDataset->DeleteBitmap(poDataset->CreateBitmap());
+    poDataset->Synchronize();
+    const unsigned int nBitmap = poDataset->CreateBitmap();
+    poDataset->SetBitmapDescription(nBitmap, "");
+    const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poDataset->GetBitmapOverviewManager());
+    poLevels->CreateLevel(2);
+    const IOPointer poIO(poDataset->GetBitmapIO({nBitmap}));
+    WriteAll(*poIO, 1, Bytes(40 * 30, 1));
+    poDataset->DeleteBitmap(nBitmap);
+    EXPECT_THROW(ReadAll(*poIO, 1), krv::DataException) << "its room may hold something else";
+    EXPECT_THROW(WriteAll(*poIO, 1, Bytes(40 * 30)), krv::DataException);
+    EXPECT_THROW(poLevels->CreateLevel(2), krv::DataException) << "there is no bitmap";
+    EXPECT_EQ(poLevels->GetLevels(), std::vector<unsigned int>{});
+    poDataset->Close();
+    EXPECT_EQ(OpenTif(fileName)->GetBitmapList(), std::vector<unsigned int>{});
+}
+
+// Rows of a strip that is larger than what is copied at once.
+TEST(TifPaths, ChannelsComeToASingleStripWithItsPixels)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("strip.tif");
+    for (const std::uint16_t nPlanar : {PLANARCONFIG_CONTIG, PLANARCONFIG_SEPARATE})
+    {
+        Handmade oFile = Handmade::Image(40, 700, 700, 1, 1, 1000, 28000);
+        oFile.Add(284, 3, 1, nPlanar);
+        Bytes oBytes = oFile.Finish(0, 29000);
+        for (std::size_t nAt = 0; nAt < 28000; ++nAt)
+            oBytes[1000 + nAt] = static_cast<unsigned char>(nAt * 7 / 5);
+        WriteBytes(fileName, oBytes);
+        TifPointer poDataset = OpenTif(fileName, eUpdate);
+        poDataset->AddNewChannel(krv::gobs::RasterInfo(40, 700, 1, krv::gobs::eDT_8U));
+        const IOPointer poOld(poDataset->GetRasterIO({1}));
+        EXPECT_TRUE(ReadAll(*poOld, 1) == Bytes(oBytes.begin() + 1000, oBytes.end()));
+        poDataset->DeleteChannel(2);
+        EXPECT_THROW(ReadAll(*poOld, 1), krv::DataException);
+        poDataset->Close();
+        EXPECT_TRUE(Judge(fileName).moPixels == Bytes(oBytes.begin() + 1000, oBytes.end()));
+    }
+}
+
+// Of a tag that is there twice the first counts; what readers and writers would see differently is not updated.
+TEST(TifPaths, DirectoriesThatContradictThemselvesDoNoHarm)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("twice.tif");
+    for (const std::uint16_t nTag : {256, 257, 258, 277, 278})
+        for (const std::uint32_t nValue : {1u, 8u, 4000u})
+        {
+            Handmade oFile;
+            for (const auto& [nNumber, nSound] : {std::pair(256, 40),
+                                                  {257, 30},
+                                                  {258, 8},
+                                                  {259, 1},
+                                                  {262, 1},
+                                                  {273, 1000},
+                                                  {277, 1},
+                                                  {278, 30},
+                                                  {279, 1200}})
+            {
+                oFile.Add(static_cast<std::uint16_t>(nNumber), 4, 1, static_cast<std::uint32_t>(nSound));
+                if (nNumber == nTag)
+                    oFile.Add(nTag, 4, 1, nValue);
+            }
+            WriteBytes(fileName, oFile.Finish(0, 3000));
+            const TifPointer poDataset = OpenTif(fileName, eUpdate);
+            poDataset->AddNewChannel(krv::gobs::RasterInfo(40, 30, 1, krv::gobs::eDT_8U));
+            WriteAll(*poDataset, Bytes(2400, 3));
+            poDataset->Close();
+            EXPECT_TRUE(Judge(fileName).moPixels == Bytes(2400, 3)) << nTag;
+        }
+    // Strips beside tiles: readers take the tiles.
+    Handmade oBoth = Handmade::Image(16, 16, 16, 1, 1, 1000, 256);
+    for (const auto& [nNumber, nValue] : {std::pair(322, 16), {323, 16}, {324, 2000}, {325, 256}})
+        oBoth.Add(static_cast<std::uint16_t>(nNumber), 4, 1, static_cast<std::uint32_t>(nValue));
+    WriteBytes(fileName, oBoth.Finish(0, 3000));
+    const Bytes oBefore = ReadAll(*OpenTif(fileName));
+    EXPECT_TRUE(ReadAll(*OpenTif(fileName, eUpdate)) == oBefore);
+}
+
+// Pages that claim the same lists over and over: 1 MB of file would be gigabytes in memory. Many pages below the first
+// are kept.
+TEST(TifPaths, TheStructureOfAFileIsBoundedByItsSize)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("lists.tif");
+    Bytes oBytes = Handmade::Image(1, 120000, 1, 1, 120000, 500000, 500000).Finish(1000, 1000000);
+    const Bytes oPage(oBytes.begin() + 8, oBytes.begin() + 8 + 2 + 9 * 12);
+    for (std::uint32_t nAt = 1000; nAt < 400000; nAt += 200)
+    {
+        std::copy(oPage.begin(), oPage.end(), oBytes.begin() + nAt);
+        for (int nByte = 0; nByte < 4; ++nByte)
+            oBytes[nAt + oPage.size() + static_cast<std::size_t>(nByte)] =
+                static_cast<unsigned char>((nAt + 200 < 400000 ? nAt + 200 : 0) >> 8 * nByte);
+    }
+    WriteBytes(fileName, oBytes);
+    try
+    {
+        OpenTif(fileName, eUpdate);
+        FAIL() << "lists of 6 GB are kept";
+    }
+    catch (const krv::FileFormatException& oException)
+    {
+        EXPECT_THAT(oException.GetMessage(), testing::HasSubstr("claim far more than the file holds"));
+    }
+
+    constexpr std::uint32_t BELOW = 1200;
+    Handmade oFirst = Handmade::Image(4, 4, 4, 1, 1, 900, 16);
+    oFirst.Add(330, 4, BELOW, 1000);
+    oBytes = oFirst.Finish(0, 1000 + BELOW * 4);
+    for (std::uint32_t nAt = 0; nAt < BELOW; ++nAt)
+    {
+        const std::size_t nPlace = oBytes.size();
+        for (int nByte = 0; nByte < 4; ++nByte)
+            oBytes[1000 + nAt * 4 + static_cast<std::size_t>(nByte)] = static_cast<unsigned char>(nPlace >> 8 * nByte);
+        const Bytes oSmall = Handmade::Image(2, 2, 2, 1, 1, 900, 4).Finish();
+        oBytes.insert(oBytes.end(), oSmall.begin() + 8, oSmall.end());
+    }
+    WriteBytes(fileName, oBytes);
+    TifPointer poDataset = OpenTif(fileName, eUpdate);
+    WriteAll(*poDataset, Bytes(16, 5));
+    poDataset->Close();
+    const TiffFile poAgain(TIFFOpen(fileName.c_str(), "r"));
+    std::uint16_t nBelow = 0;
+    toff_t* pBelow = nullptr;
+    ASSERT_EQ(TIFFGetField(poAgain.get(), TIFFTAG_SUBIFD, &nBelow, &pBelow), 1);
+    EXPECT_EQ(nBelow, BELOW);
+}
+
+// What a dataset says of its file.
+std::string Describe(krv::plugins::tif::TifDataset& oDataset)
+{
+    const AuxiliaryData oRecord = oDataset.ReadAuxiliaryData();
+    std::ostringstream oText;
+    oText << oRecord.GetChannelCount() << testing::PrintToString(oRecord.GetFileMetadata());
+    for (unsigned int nChannel = 1; nChannel <= oRecord.GetChannelCount(); ++nChannel)
+        oText << testing::PrintToString(oRecord.GetChanMetadata(nChannel)) << oRecord.GetChannelDescription(nChannel);
+    const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(oDataset.GetOverviewManager());
+    oText << testing::PrintToString(poLevels->GetLevels()) << testing::PrintToString(oDataset.GetBitmapList())
+          << testing::PrintToString(oDataset.GetPCTList());
+    for (const unsigned int nBitmap : oDataset.GetBitmapList())
+        oText << oDataset.GetBitmapDescription(nBitmap) << poLevels->IsValid(1, 2);
+    return oText.str();
+}
+
+// Each fails at its last step, after it has changed something.
+TEST(TifPaths, AnOperationThatThrowsChangesNothing)
+{
+    struct Case
+    {
+        const char* mpName;
+        void (*mpAct)(krv::plugins::tif::TifDataset&);
+    };
+    constexpr Case CASES[] = {
+        {"channel deleted",
+         [](auto& oDataset)
+         {
+             oDataset.DeleteChannel(2);
+         }},
+        {"channel added",
+         [](auto& oDataset)
+         {
+             oDataset.AddNewChannel(krv::gobs::RasterInfo(32, 32, 1, krv::gobs::eDT_8U));
+         }},
+        {"record of one channel",
+         [](auto& oDataset)
+         {
+             oDataset.WriteAuxiliaryData(AuxiliaryData(1));
+         }},
+        {"level whose page cannot be read",
+         [](auto& oDataset)
+         {
+             const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(oDataset.GetBitmapOverviewManager());
+             poLevels->CreateLevel(2);
+         }},
+        {"metadata of a mask that cannot be read",
+         [](auto& oDataset)
+         {
+             oDataset.SetBitmapMetadata(1, {{"a", "b"}});
+         }},
+    };
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("whole.tif");
+    for (const Case& oCase : CASES)
+    {
+        SCOPED_TRACE(oCase.mpName);
+        // An image of two channels, a level of deflate that is none, a mask of a codec that does not exist.
+        Bytes oBytes = Handmade::Image(32, 32, 32, 1, 1, 3000, 2048, 8, 1, 2).Finish(1000, 8000);
+        Handmade oLevel = Handmade::Image(16, 16, 16, 8, 1, 6000, 500, 8, 1, 2);
+        oLevel.Add(254, 4, 1, 1);
+        Handmade oMask = Handmade::Image(32, 32, 32, 9, 1, 7000, 128, 1, 4);
+        oMask.Add(254, 4, 1, 4);
+        const Bytes oSecond = oLevel.Finish(1500), oThird = oMask.Finish();
+        std::copy(oSecond.begin() + 8, oSecond.end(), oBytes.begin() + 1000);
+        std::copy(oThird.begin() + 8, oThird.end(), oBytes.begin() + 1500);
+        std::fill(oBytes.begin() + 6000, oBytes.end(), static_cast<unsigned char>(0xAB));
+        WriteBytes(fileName, oBytes);
+        const TifPointer poDataset = OpenTif(fileName, eUpdate);
+        const Bytes oPixels = ReadAll(*poDataset);
+        const std::string before = Describe(*poDataset);
+        EXPECT_THROW(oCase.mpAct(*poDataset), krv::Exception);
+        EXPECT_EQ(Describe(*poDataset), before);
+        EXPECT_TRUE(ReadAll(*poDataset) == oPixels);
+        WriteAll(*IOPointer(poDataset->GetRasterIO({1})), 1, Bytes(32 * 32, 77));
+        poDataset->Synchronize();
+        poDataset->Close();
+        const TifPointer poRead = OpenTif(fileName);
+        EXPECT_TRUE(ReadAll(*IOPointer(poRead->GetRasterIO({1})), 1) == Bytes(32 * 32, 77));
+        EXPECT_EQ(poRead->GetChanCount(), 2u);
+    }
+    // A table for bits whose number no tag tells.
+    Handmade oBits;
+    for (const auto& [nNumber, nValue] :
+         {std::pair(256, 16), {257, 16}, {259, 1}, {262, 1}, {273, 200}, {278, 16}, {279, 32}})
+        oBits.Add(static_cast<std::uint16_t>(nNumber), 4, 1, static_cast<std::uint32_t>(nValue));
+    WriteBytes(fileName, oBits.Finish(0, 300));
+    const TifPointer poDataset = OpenTif(fileName, eUpdate);
+    poDataset->CreatePCT(krv::gobs::PCT::FromColours(std::vector<krv::gobs::RGBTuple<std::uint16_t>>(2)), 1);
+    poDataset->Close();
+    EXPECT_EQ(OpenTif(fileName)->GetPCTList(), std::vector<unsigned int>{1});
+}
+
 } // namespace
