@@ -287,7 +287,7 @@ void OverviewBuilder::ReadWindow(const PixelBounds& oBounds)
     moWriter.ReadRaster(&oRaster);
     const unsigned char* const pValid = moForm.mbValidity ? moValidity.Mark(oRaster) : nullptr;
     for (const auto& oReducer : moReducers)
-        oReducer->Add({oBounds, oRaster.GetBuffer(), pValid});
+        oReducer->Add({oBounds, oRaster.GetBuffer(), pValid, moValidity.GetRows()});
     mnDone += std::uint64_t{oBounds.GetWidth()} * oBounds.GetHeight();
 }
 

@@ -2,6 +2,7 @@
 #include "datasources/writer/detail/levelreducer.h"
 #include "datasources/writer/detail/leveltarget.h"
 #include "datasources/writer/detail/samplemath.h"
+#include "datasources/writer/detail/samplevectors.h"
 
 #include <algorithm>
 #include <bit>
@@ -15,7 +16,7 @@ namespace
 {
 
 // Sums of boxes, or samples of the image, and for each how many samples are in
-// it: bytes for the image, 32-bit numbers above; null without validity.
+// it: bytes for the image; null without validity.
 struct SumRow
 {
     unsigned char* mpSums = nullptr;
@@ -47,6 +48,7 @@ public:
     virtual ~IAverageSteps() = default;
     // Bytes of a sum and of a count.
     virtual std::size_t GetSumBytes(unsigned int nStage) const = 0;
+    virtual std::size_t GetCountBytes(unsigned int nStage) const = 0;
     // Sums of stage nStage from two rows of nPixels pixels of the stage below; a
     // row beyond the image is zeros. May write the means of the first boxes too,
     // as if they were whole, to pPixels unless that is null; gives their number.
@@ -54,9 +56,11 @@ public:
                             const SumRow& oSums, unsigned char* pPixels) const = 0;
     // Does the same for blocks of whole boxes; null where only Sum can.
     virtual ReduceLoop GetLoop(unsigned int) const { return nullptr; }
+    // Counts of whole boxes without anything that is not valid.
+    virtual void FillCounts(unsigned int, unsigned char*, std::size_t) const {}
     // Pixels of a level from box nFirst on, and with counts the validity of their
-    // values.
-    virtual void Finish(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, std::size_t nFirst,
+    // values; true when all are valid, which need not be written then.
+    virtual bool Finish(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, std::size_t nFirst,
                         unsigned char* pPixels, unsigned char* pValid) const = 0;
 };
 
@@ -70,6 +74,7 @@ public:
     }
 
     std::size_t GetSumBytes(unsigned int nStage) const override { return nStage == 0 ? sizeof(T) : sizeof(SumOf<T>); }
+    std::size_t GetCountBytes(unsigned int nStage) const override { return nStage == 0 ? 1 : sizeof(std::uint32_t); }
 
     std::size_t Sum(unsigned int nStage, const SumRow& oFirst, const SumRow& oSecond, std::size_t nPixels,
                     const SumRow& oSums, unsigned char*) const override
@@ -84,9 +89,10 @@ public:
         return 0;
     }
 
-    void Finish(unsigned int, const SumRow& oSums, const BoxRow& oBoxes, std::size_t nFirst, unsigned char* pPixels,
+    bool Finish(unsigned int, const SumRow& oSums, const BoxRow& oBoxes, std::size_t nFirst, unsigned char* pPixels,
                 unsigned char* pValid) const override
     {
+        bool bAll = true;
         const auto* const pSums = reinterpret_cast<const SumOf<T>*>(oSums.mpSums);
         const auto* const pCounts = reinterpret_cast<const std::uint32_t*>(oSums.mpCounts);
         for (std::size_t nBox = nFirst; nBox < oBoxes.mnBoxes; ++nBox)
@@ -101,7 +107,9 @@ public:
                 std::memcpy(pPixels + nAt * sizeof(T), &nMean, sizeof(T));
                 if (pValid != nullptr)
                     pValid[nValue] = bValid;
+                bAll = bAll && bValid;
             }
+        return bAll;
     }
 
 private:
@@ -167,6 +175,7 @@ public:
         const std::size_t nBits = 8 * sizeof(T) + 2 * nStage;
         return std::is_floating_point_v<T> || nBits > 32 ? 8 : nBits > 16 ? 4 : 2;
     }
+    std::size_t GetCountBytes(unsigned int) const override { return 0; }
 
     ReduceLoop GetLoop(unsigned int nStage) const override
     {
@@ -187,7 +196,7 @@ public:
         return nPixels / 2;
     }
 
-    void Finish(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, std::size_t nFirst,
+    bool Finish(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, std::size_t nFirst,
                 unsigned char* pPixels, unsigned char*) const override
     {
         for (std::size_t nBox = nFirst; nBox < oBoxes.mnBoxes; ++nBox)
@@ -196,9 +205,9 @@ public:
                 const T nMean = MeanOf<T>(Get(oSums, nStage, n), oBoxes.GetSize(nBox));
                 std::memcpy(pPixels + n * sizeof(T), &nMean, sizeof(T));
             }
+        return true;
     }
 
-private:
     // Calls oAction with a value of the type that a stage's sums have.
     template <typename Action>
     auto As(unsigned int nStage, const Action& oAction) const
@@ -221,6 +230,8 @@ private:
                       return static_cast<SumOf<T>>(nSum);
                   });
     }
+
+private:
     void Set(const SumRow& oRow, unsigned int nStage, std::size_t nAt, SumOf<T> nValue) const
     {
         As(nStage,
@@ -235,16 +246,142 @@ private:
     unsigned int mnSamples;
 };
 
+// By the same loops with validity: samples that are not valid are made zero, and those that are valid are counted as
+// bytes of ones.
+template <typename T>
+class MaskedSteps : public IAverageSteps
+{
+public:
+    MaskedSteps(const SourceForm& oForm, bool bHalfValid)
+        : moSums(oForm), moCounts({oForm.mnWidth, oForm.mnHeight, oForm.mnChannels, krv::gobs::eDT_8U, false}),
+          mnSamples(oForm.mnChannels), mbHalfValid(bHalfValid)
+    {
+    }
+
+    std::size_t GetSumBytes(unsigned int nStage) const override { return moSums.GetSumBytes(nStage); }
+    std::size_t GetCountBytes(unsigned int nStage) const override { return moCounts.GetSumBytes(nStage); }
+    ReduceLoop GetLoop(unsigned int nStage) const override { return moSums.GetLoop(nStage); }
+
+    // The means are those of boxes that are valid as a whole; Finish puts the others right.
+    std::size_t Sum(unsigned int nStage, const SumRow& oFirst, const SumRow& oSecond, std::size_t nPixels,
+                    const SumRow& oSums, unsigned char* pPixels) const override
+    {
+        if (nStage == 1)
+            moSums.Sum(nStage, Cleared(oFirst, nPixels, moFirst), Cleared(oSecond, nPixels, moSecond), nPixels, oSums,
+                       pPixels);
+        else
+            moSums.Sum(nStage, oFirst, oSecond, nPixels, oSums, pPixels);
+        moCounts.Sum(nStage, CountsOf(oFirst), CountsOf(oSecond), nPixels, CountsOf(oSums), nullptr);
+        return 0;
+    }
+
+    void FillCounts(unsigned int nStage, unsigned char* pCounts, std::size_t nPixels) const override
+    {
+        moCounts.As(nStage,
+                    [&](auto nCount)
+                    {
+                        nCount = static_cast<decltype(nCount)>(std::uint64_t{1} << 2 * nStage);
+                        for (std::size_t n = 0; n < nPixels * mnSamples; ++n)
+                            std::memcpy(pCounts + n * sizeof nCount, &nCount, sizeof nCount);
+                    });
+    }
+
+    bool Finish(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, std::size_t, unsigned char* pPixels,
+                unsigned char* pValid) const override
+    {
+        return moCounts.As(nStage, [&](auto nCount)
+                           { return FinishBy<decltype(nCount)>(nStage, oSums, oBoxes, pPixels, pValid); });
+    }
+
+private:
+    static SumRow CountsOf(const SumRow& oRow) { return {oRow.mpCounts, nullptr}; }
+
+    template <typename Count>
+    bool FinishBy(unsigned int nStage, const SumRow& oSums, const BoxRow& oBoxes, unsigned char* pPixels,
+                  unsigned char* pValid) const
+    {
+        const std::uint64_t nWhole = std::uint64_t{1} << 2 * nStage;
+        const auto* const pCounts = reinterpret_cast<const Count*>(oSums.mpCounts);
+        const std::size_t nValues = oBoxes.mnBoxes * mnSamples;
+        std::memset(pValid, 1, nValues);
+        using Vectors = VectorsOf<Count>;
+        const auto oWhole = typename Vectors::Samples{} + static_cast<Count>(nWhole);
+        bool bAll = true;
+        for (std::size_t n = 0; n < nValues;)
+        {
+            // Most are whole, many in a row.
+            if (n + Vectors::LANES <= nValues && std::memcmp(pCounts + n, &oWhole, sizeof oWhole) == 0)
+            {
+                n += Vectors::LANES;
+                continue;
+            }
+            for (const std::size_t nEnd = std::min(n + Vectors::LANES, nValues); n < nEnd; ++n)
+                if (pCounts[n] != nWhole)
+                    bAll = FinishValue(nStage, oSums, n, pCounts[n], oBoxes.GetSize(n / mnSamples), pPixels, pValid) &&
+                           bAll;
+        }
+        return bAll;
+    }
+
+    bool FinishValue(unsigned int nStage, const SumRow& oSums, std::size_t nAt, std::uint64_t nCount,
+                     std::uint64_t nSize, unsigned char* pPixels, unsigned char* pValid) const
+    {
+        const bool bValid = nCount != 0 && (!mbHalfValid || 2 * nCount >= nSize);
+        const T nMean = bValid ? MeanOf<T>(moSums.Get(oSums, nStage, nAt), nCount) : T(0);
+        std::memcpy(pPixels + nAt * sizeof(T), &nMean, sizeof(T));
+        pValid[nAt] = bValid;
+        return bValid;
+    }
+
+    SumRow Cleared(const SumRow& oRow, std::size_t nPixels, std::vector<T>& oSamples) const
+    {
+        using Vectors = VectorsOf<T>;
+        const std::size_t nCount = nPixels * mnSamples;
+        oSamples.resize(nCount);
+        auto* const pTo = reinterpret_cast<unsigned char*>(oSamples.data());
+        std::size_t n = 0;
+        for (; n + Vectors::LANES <= nCount; n += Vectors::LANES)
+        {
+            const auto oValid =
+                __builtin_convertvector(LoadVector<typename Vectors::Valid>(oRow.mpCounts + n), typename Vectors::Bits);
+            const auto oKept =
+                LoadVector<typename Vectors::Bits>(oRow.mpSums + n * sizeof(T)) & (typename Vectors::Bits{} - oValid);
+            std::memcpy(pTo + n * sizeof(T), &oKept, sizeof oKept);
+        }
+        for (; n < nCount; ++n)
+        {
+            std::memcpy(&oSamples[n], oRow.mpSums + n * sizeof(T), sizeof(T));
+            oSamples[n] = oRow.mpCounts[n] != 0 ? oSamples[n] : T(0);
+        }
+        return {pTo, nullptr};
+    }
+
+    VectorSteps<T> moSums;
+    VectorSteps<std::uint8_t> moCounts;
+    std::size_t mnSamples;
+    bool mbHalfValid;
+    mutable std::vector<T> moFirst;
+    mutable std::vector<T> moSecond;
+};
+
+template <typename T>
+std::unique_ptr<IAverageSteps> MakeVectorSteps(const SourceForm& oForm, bool bHalfValid)
+{
+    if (oForm.mbValidity)
+        return std::make_unique<MaskedSteps<T>>(oForm, bHalfValid);
+    return std::make_unique<VectorSteps<T>>(oForm);
+}
+
 std::unique_ptr<IAverageSteps> MakeSteps(const SourceForm& oForm, bool bHalfValid)
 {
-    const bool bVectors = !oForm.mbValidity && oForm.GetSamples() <= MOST_LOOP_SAMPLES;
+    const bool bVectors = oForm.GetSamples() <= MOST_LOOP_SAMPLES;
     const auto eType = oForm.moType.GetNativeCode();
     if (bVectors && eType == krv::gobs::eDT_8U)
-        return std::make_unique<VectorSteps<std::uint8_t>>(oForm);
+        return MakeVectorSteps<std::uint8_t>(oForm, bHalfValid);
     if (bVectors && eType == krv::gobs::eDT_16U)
-        return std::make_unique<VectorSteps<std::uint16_t>>(oForm);
+        return MakeVectorSteps<std::uint16_t>(oForm, bHalfValid);
     if (bVectors && eType == krv::gobs::eDT_32R)
-        return std::make_unique<VectorSteps<float>>(oForm);
+        return MakeVectorSteps<float>(oForm, bHalfValid);
     return ForSampleType(oForm.moType,
                          [&](auto nSample) -> std::unique_ptr<IAverageSteps>
                          { return std::make_unique<AnySteps<decltype(nSample)>>(oForm, bHalfValid); });
@@ -292,6 +429,7 @@ private:
     std::vector<Stage> moStages; // the image, then factors 2, 4, ...
     std::unique_ptr<IAverageSteps> mpoSteps;
     std::vector<unsigned char> moZeros;
+    std::vector<unsigned char> moOnes;     // the validity of rows of windows without any
     std::vector<unsigned char> moBlock[2]; // sums of one stage of a block and of the next
     std::vector<unsigned char> moValid;
 };
@@ -314,7 +452,7 @@ AverageCascade::AverageCascade(const SourceForm& oForm, const std::vector<LevelT
         oStage.mnHeight = ((oForm.mnHeight - 1) >> nStage) + 1;
         oStage.mpLoop = nStage == 0 ? nullptr : mpoSteps->GetLoop(nStage);
         oStage.mnSumBytes = mpoSteps->GetSumBytes(nStage) * oForm.GetSamples();
-        oStage.mnCountBytes = !mbCounts ? 0 : oForm.mnChannels * (nStage == 0 ? 1 : sizeof(std::uint32_t));
+        oStage.mnCountBytes = !mbCounts ? 0 : oForm.mnChannels * mpoSteps->GetCountBytes(nStage);
         const std::size_t nPixels = (oBounds.GetWidth() >> nStage) + 1;
         for (unsigned int nSlot = 0; nSlot < 2; ++nSlot)
         {
@@ -347,8 +485,10 @@ void AverageCascade::Add(const SourceWindow& oWindow)
     const unsigned int nWhole = nStages == 0 ? 0 : oBounds.GetWidth() / nColumns * nColumns;
     for (unsigned int nY = oBounds.mnTop; nY < oBounds.mnBottom;)
     {
-        const unsigned int nRows = std::min(nMostRows, oBounds.mnBottom - nY) / nUnit * nUnit;
-        const bool bBlock = nWhole != 0 && nY % nUnit == 0 && nRows != 0;
+        unsigned int nRows = std::min(nMostRows, oBounds.mnBottom - nY) / nUnit * nUnit;
+        if (!oWindow.AreValid(nY - oBounds.mnTop, nRows))
+            nRows = nUnit;
+        const bool bBlock = nWhole != 0 && nY % nUnit == 0 && nRows != 0 && oWindow.AreValid(nY - oBounds.mnTop, nRows);
         if (bBlock)
             AddBlock(oWindow, nY, nWhole, nRows, nStages);
         const unsigned int nX = oBounds.mnLeft + (bBlock ? nWhole : 0);
@@ -399,7 +539,12 @@ void AverageCascade::AddBlock(const SourceWindow& oWindow, unsigned int nY, unsi
         if (nStage + 1 == moStages.size())
             oJob.mpSums = nullptr;
         else if (nStage == nStages)
-            oJob.mpSums = At(nStage, nX, nY).mpSums;
+        {
+            const SumRow oWaiting = At(nStage, nX, nY);
+            oJob.mpSums = oWaiting.mpSums;
+            if (mbCounts)
+                mpoSteps->FillCounts(nStage, oWaiting.mpCounts, nPixels);
+        }
         else
         {
             oSums.resize(std::max(oSums.size(), nRows * oJob.mnSumPitch));
@@ -425,9 +570,15 @@ void AverageCascade::AddRow(const SourceWindow& oWindow, unsigned int nX, unsign
     const auto Row = [&](unsigned int nRow)
     {
         const std::size_t nPixel = std::size_t{nRow - oBounds.mnTop} * oBounds.GetWidth() + (nX - oBounds.mnLeft);
-        return SumRow{const_cast<unsigned char*>(oWindow.mpPixels) + nPixel * oImage.mnSumBytes,
-                      mbCounts ? const_cast<unsigned char*>(oWindow.mpValid) + nPixel * oImage.mnCountBytes : nullptr};
+        SumRow oRow{const_cast<unsigned char*>(oWindow.mpPixels) + nPixel * oImage.mnSumBytes, nullptr};
+        if (mbCounts)
+            oRow.mpCounts = oWindow.mpValid != nullptr
+                                ? const_cast<unsigned char*>(oWindow.mpValid) + nPixel * oImage.mnCountBytes
+                                : moOnes.data();
+        return oRow;
     };
+    if (mbCounts && oWindow.mpValid == nullptr)
+        moOnes.resize(std::max(moOnes.size(), nPixels * oImage.mnCountBytes), 1);
     if (nY % 2 != 0)
         AddRows(nY > oBounds.mnTop ? Row(nY - 1) : At(0, nX, nY - 1), Row(nY), nX, nY / 2, nPixels);
     else if (nY + 1 == oImage.mnHeight)
@@ -491,9 +642,10 @@ void AverageCascade::PutRow(unsigned int nStage, const SumRow& oSums, unsigned i
         moValid.resize(std::max(moValid.size(), std::size_t{nPixels} * moForm.mnChannels));
     const std::size_t nWhole = oBoxes.mnLastColumns == nFactor ? nPixels : nPixels - 1;
     const std::size_t nFirst = oBoxes.mnRows == nFactor ? std::min(nRounded, nWhole) : 0;
+    bool bAll = true;
     if (nFirst < nPixels)
-        mpoSteps->Finish(nStage, oSums, oBoxes, nFirst, pPixels, mbCounts ? moValid.data() : nullptr);
-    oStage.mpoTarget->End(mbCounts ? moValid.data() : nullptr);
+        bAll = mpoSteps->Finish(nStage, oSums, oBoxes, nFirst, pPixels, mbCounts ? moValid.data() : nullptr);
+    oStage.mpoTarget->End(bAll ? nullptr : moValid.data());
 }
 
 } // namespace

@@ -1,5 +1,6 @@
 #include "datasources/writer/detail/levelreducer.h"
 #include "datasources/writer/detail/leveltarget.h"
+#include "datasources/writer/detail/modeof.h"
 #include "datasources/writer/detail/samplemath.h"
 
 #include <algorithm>
@@ -226,6 +227,17 @@ public:
         {
             if (nY < moTask.moBounds.mnTop * nFactor || nY >= nEnd)
                 continue;
+            if constexpr (MODE)
+            {
+                const auto nRows =
+                    static_cast<unsigned int>(GetBoxSize(nY / moTask.mnFactor, moTask.mnFactor, moForm.mnHeight));
+                if (nY % nFactor == 0 && nFactor <= MOST_WHOLE_FACTOR && nRows <= oWindow.moBounds.mnBottom - nY)
+                {
+                    PutWhole(oWindow, nY, nRows);
+                    nY += nRows - 1;
+                    continue;
+                }
+            }
             AddRow(oWindow, nY);
             if ((nY + 1) % nFactor == 0 || nY + 1 == moForm.mnHeight)
                 PutRow(static_cast<unsigned int>(nY / nFactor));
@@ -233,6 +245,78 @@ public:
     }
 
 private:
+    // Modes of boxes that lie in one window are found box by box.
+    static constexpr bool MODE = std::is_same_v<Box, ModeBox<T, P>> && P == 1;
+    static constexpr unsigned int MOST_WHOLE_FACTOR = 64;
+
+    void PutWhole(const SourceWindow& oWindow, unsigned int nY, unsigned int nRows)
+    {
+        const PixelBounds& oTo = moTask.moBounds;
+        const std::size_t nRowValues = std::size_t{oWindow.moBounds.GetWidth()} * moForm.mnChannels;
+        const unsigned int nFirstRow = nY - oWindow.moBounds.mnTop;
+        const bool bAll = oWindow.AreValid(nFirstRow, nRows);
+        moValid.assign(moBoxes.size(), 1);
+        moValues.resize(std::size_t{moTask.mnFactor} * moTask.mnFactor);
+        unsigned char* const pRow = moTask.mpoTarget->Begin(oTo.mnLeft, nY / moTask.mnFactor, oTo.GetWidth());
+        const std::size_t nChannels = moForm.mnChannels;
+        std::size_t nFirst =
+            nFirstRow * nRowValues + (std::size_t{oTo.mnLeft} * moTask.mnFactor - oWindow.moBounds.mnLeft) * nChannels;
+        std::size_t nTo = 0;
+        for (unsigned int nX = oTo.mnLeft; nX < oTo.mnRight; ++nX, nFirst += moTask.mnFactor * nChannels)
+        {
+            const std::size_t nColumns = GetBoxSize(nX, moTask.mnFactor, moForm.mnWidth);
+            for (std::size_t nChannel = 0; nChannel < nChannels; ++nChannel, ++nTo)
+            {
+                const unsigned char* const pSamples = oWindow.mpPixels + (nFirst + nChannel) * sizeof(T);
+                const std::size_t nCount =
+                    bAll ? TakeAll(pSamples, nColumns, nRows, nRowValues)
+                         : TakeValid(pSamples, oWindow.mpValid + nFirst + nChannel, nColumns, nRows, nRowValues);
+                moValid[nTo] = nCount != 0 && (!mbHalfValid || 2 * nCount >= nColumns * nRows);
+                const T nMode = moValid[nTo] != 0 ? ModeOf(moValues.data(), nCount) : T(0);
+                std::memcpy(pRow + nTo * sizeof(T), &nMode, sizeof(T));
+            }
+        }
+        moTask.mpoTarget->End(bAll ? nullptr : moValid.data());
+    }
+
+    // One channel of a box, the samples from pSamples on.
+    std::size_t TakeAll(const unsigned char* pSamples, std::size_t nColumns, std::size_t nRows, std::size_t nRowValues)
+    {
+        const std::size_t nStep = moForm.mnChannels * sizeof(T), nPitch = nRowValues * sizeof(T);
+        if (nColumns == 2 && nRows == 2)
+            return TakeSquare<2>(pSamples, nStep, nPitch);
+        if (nColumns == 4 && nRows == 4)
+            return TakeSquare<4>(pSamples, nStep, nPitch);
+        T* pTo = moValues.data();
+        for (std::size_t nRow = 0; nRow < nRows; ++nRow, pSamples += nPitch)
+            for (std::size_t n = 0; n < nColumns; ++n)
+                std::memcpy(pTo++, pSamples + n * nStep, sizeof(T));
+        return nColumns * nRows;
+    }
+    template <std::size_t SIDE>
+    std::size_t TakeSquare(const unsigned char* pSamples, std::size_t nStep, std::size_t nPitch)
+    {
+        T* const pTo = moValues.data();
+        for (std::size_t nRow = 0; nRow < SIDE; ++nRow)
+            for (std::size_t n = 0; n < SIDE; ++n)
+                std::memcpy(pTo + nRow * SIDE + n, pSamples + nRow * nPitch + n * nStep, sizeof(T));
+        return SIDE * SIDE;
+    }
+    std::size_t TakeValid(const unsigned char* pSamples, const unsigned char* pValid, std::size_t nColumns,
+                          std::size_t nRows, std::size_t nRowValues)
+    {
+        std::size_t nTaken = 0;
+        const std::size_t nStep = moForm.mnChannels;
+        for (std::size_t nRow = 0; nRow < nRows; ++nRow, pSamples += nRowValues * sizeof(T), pValid += nRowValues)
+            for (std::size_t n = 0; n < nColumns; ++n)
+            {
+                // Never beyond the box: what is not valid is written over.
+                std::memcpy(&moValues[nTaken], pSamples + n * nStep * sizeof(T), sizeof(T));
+                nTaken += pValid[n * nStep];
+            }
+        return nTaken;
+    }
+
     void AddRow(const SourceWindow& oWindow, unsigned int nY)
     {
         const unsigned int nChannels = moForm.mnChannels;
@@ -282,6 +366,7 @@ private:
     bool mbHalfValid;
     std::vector<Box> moBoxes;
     std::vector<unsigned char> moValid;
+    std::vector<T> moValues; // of one box
 };
 
 // Copies whole pixels.

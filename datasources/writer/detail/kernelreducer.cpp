@@ -138,7 +138,7 @@ private:
 
     void SumRow(const SourceWindow& oWindow, unsigned int nY)
     {
-        moSum.Resize(GetSize(), oWindow.mpValid != nullptr, mbClamp);
+        moSum.Resize(GetSize(), moForm.mbValidity, mbClamp);
         const PixelBounds& oBounds = oWindow.moBounds;
         const std::size_t nFirst = std::size_t{nY - oBounds.mnTop} * oBounds.GetWidth();
         for (unsigned int nX = moTask.moBounds.mnLeft; nX < moTask.moBounds.mnRight; ++nX)
@@ -157,12 +157,10 @@ private:
             const std::size_t nFrom = nPixel * mnSamples + n;
             T nSample;
             std::memcpy(&nSample, oWindow.mpPixels + nFrom * sizeof(T), sizeof(T));
-            if (oWindow.mpValid != nullptr)
-            {
-                if (oWindow.mpValid[nFrom / mnParts] == 0)
-                    continue;
+            if (oWindow.mpValid != nullptr && oWindow.mpValid[nFrom / mnParts] == 0)
+                continue;
+            if (moForm.mbValidity)
                 moSum.moWeights[nTo + n] += nWeight;
-            }
             moSum.moSums[nTo + n] += static_cast<Real>(nSample) * nWeight;
             if (mbClamp)
                 moSum.Widen(nTo + n, nSample, nSample);

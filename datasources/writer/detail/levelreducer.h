@@ -3,6 +3,7 @@
 #include "datasources/writer/overviewbuilder.h"
 #include "gobs/raster/datatype.h"
 
+#include <algorithm>
 #include <cstdint>
 #include <memory>
 #include <vector>
@@ -30,12 +31,20 @@ struct PixelBounds
 };
 
 // Pixels of the image, interleaved, rows without padding; for each value a
-// byte, 1 when it is valid and else 0, or null when all are.
+// byte, 1 when it is valid and else 0, or null when all are; with it for each
+// row a byte, 1 when something in it is not valid.
 struct SourceWindow
 {
     PixelBounds moBounds;
     const unsigned char* mpPixels;
     const unsigned char* mpValid;
+    const unsigned char* mpRows = nullptr;
+
+    // Whether all values of some rows, counted from the first of the window, are valid.
+    bool AreValid(unsigned int nRow, unsigned int nRows) const
+    {
+        return mpValid == nullptr || std::find(mpRows + nRow, mpRows + nRow + nRows, 1) == mpRows + nRow + nRows;
+    }
 };
 
 // What all levels have in common.

@@ -81,7 +81,8 @@ void TileGatherer::Put(unsigned int nX, unsigned int nY, unsigned int nCount, co
 }
 
 LevelTarget::LevelTarget(TileGatherer oPixels, const SourceForm& oForm, const IValueFinisher* poFinisher)
-    : moPixels(std::move(oPixels)), mpoFinisher(poFinisher), mnChannels(oForm.mnChannels),
+    : moPixels(std::move(oPixels)), mpoFinisher(poFinisher),
+      mbFinish(poFinisher != nullptr && poFinisher->ChangesValid()), mnChannels(oForm.mnChannels),
       mnPixelBytes(oForm.GetPixelBytes())
 {
 }
@@ -94,21 +95,25 @@ unsigned char* LevelTarget::BeginApart()
 
 void LevelTarget::EndRows(const unsigned char* pValid)
 {
-    const std::size_t nPixels = std::size_t{mnWidth} * mnHeight;
-    if (pValid != nullptr)
-        mpoFinisher->Finish(mpDirect != nullptr ? mpDirect : moApart.data(), pValid, nPixels);
+    const std::size_t nValues = std::size_t{mnWidth} * mnChannels;
+    unsigned char* const pFirst = mpDirect != nullptr ? mpDirect : moApart.data();
+    const std::size_t nPitch = GetPitch();
+    for (unsigned int n = 0; n < mnHeight && (pValid != nullptr || mbFinish); ++n)
+        mpoFinisher->Finish(pFirst + n * nPitch, pValid != nullptr ? pValid + n * nValues : nullptr, nValues);
     if (mpDirect != nullptr)
-        moPixels.Note(nPixels);
+        moPixels.Note(std::size_t{mnWidth} * mnHeight);
     else
         for (unsigned int n = 0; n < mnHeight; ++n)
             moPixels.Put(mnX, mnY + n, mnWidth, moApart.data() + std::size_t{n} * mnWidth * mnPixelBytes);
     if (mpoMask == nullptr)
         return;
-    moMaskRow.assign(mnWidth, static_cast<unsigned char>(pValid == nullptr));
-    for (std::size_t n = 0; pValid != nullptr && n < std::size_t{mnWidth} * mnChannels; ++n)
-        moMaskRow[n / mnChannels] |= pValid[n];
     for (unsigned int n = 0; n < mnHeight; ++n)
+    {
+        moMaskRow.assign(mnWidth, static_cast<unsigned char>(pValid == nullptr));
+        for (std::size_t nAt = 0; pValid != nullptr && nAt < nValues; ++nAt)
+            moMaskRow[nAt / mnChannels] |= pValid[n * nValues + nAt];
         mpoMask->Put(mnX, mnY + n, mnWidth, moMaskRow.data());
+    }
 }
 
 } // namespace krv::datasources::detail

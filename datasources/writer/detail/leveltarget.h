@@ -79,7 +79,10 @@ class IValueFinisher
 {
 public:
     virtual ~IValueFinisher();
-    virtual void Finish(unsigned char* pPixels, const unsigned char* pValid, std::size_t nPixels) const = 0;
+    // Values from the first channel on; pValid: a byte per value, or null when all are valid.
+    virtual void Finish(unsigned char* pValues, const unsigned char* pValid, std::size_t nValues) const = 0;
+    // Whether it has something to do where all are valid.
+    virtual bool ChangesValid() const = 0;
 };
 
 // Where the pixels of a level go, and those of the mask's level when there is
@@ -102,10 +105,10 @@ public:
     }
     // Bytes from row to row of that memory.
     std::size_t GetPitch() const { return mpDirect != nullptr ? moPixels.GetPitch() : mnWidth * mnPixelBytes; }
-    // pValid: a byte per value, or null when all are valid, as those of several rows must be.
+    // pValid: a byte per value, or null when all are valid.
     void End(const unsigned char* pValid)
     {
-        if (mpDirect != nullptr && pValid == nullptr && mpoMask == nullptr)
+        if (mpDirect != nullptr && pValid == nullptr && mpoMask == nullptr && !mbFinish)
             moPixels.Note(std::size_t{mnWidth} * mnHeight);
         else
             EndRows(pValid);
@@ -117,7 +120,8 @@ private:
 
     TileGatherer moPixels;
     std::unique_ptr<TileGatherer> mpoMask;
-    const IValueFinisher* mpoFinisher; // borrowed
+    const IValueFinisher* mpoFinisher; // borrowed; null: values are always valid
+    bool mbFinish;                     // valid values too
     unsigned int mnChannels;
     std::size_t mnPixelBytes;
     std::vector<unsigned char> moApart;

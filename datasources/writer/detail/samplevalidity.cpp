@@ -4,12 +4,14 @@
 #include "datasources/metadata/typednodata.h"
 #include "datasources/reader/idatasetaccess.h"
 #include "datasources/reader/validitysource.h"
+#include "datasources/writer/detail/samplevectors.h"
 #include "datasources/writer/irasterwriter.h"
 #include "gobs/mask/exactmaskdecision.h"
 #include "gobs/mask/mask.h"
 #include "gobs/mask/samplematch.h"
 #include "toolkit/nspio/warning.h"
 
+#include <algorithm>
 #include <cmath>
 #include <cstring>
 #include <limits>
@@ -42,7 +44,7 @@ bool IsSet(const unsigned char* pBits, std::size_t nBit)
 }
 
 template <typename T>
-T Above(T nValue)
+T Beside(T nValue)
 {
     const bool bUp = nValue < std::numeric_limits<T>::max();
     if constexpr (std::is_floating_point_v<T>)
@@ -51,93 +53,290 @@ T Above(T nValue)
         return static_cast<T>(bUp ? nValue + 1 : nValue - 1);
 }
 
-// Complex values: the no-data value is that of the real part, the imaginary one
-// is 0, or NaN with it.
+// What a channel's samples are compared with, for real types and their options.
+template <typename T>
+struct ChannelRule
+{
+    bool mbNoData = false; // there is a value, maybe NaN
+    T mnValue = T(0);      // of what is not valid
+    bool mbNaN = false;    // NaN samples are not valid
+};
+
+template <typename T>
+std::vector<ChannelRule<T>> MakeRules(const AuxiliaryData& oMetadata, unsigned int nChannels, bool bNaNIsNoData)
+{
+    std::vector<ChannelRule<T>> oRules;
+    for (unsigned int nChannel = 1; nChannel <= nChannels; ++nChannel)
+    {
+        const krv::gobs::SampleMatch<T> oMatch(GetTypedNoData(oMetadata, nChannel));
+        ChannelRule<T> oRule{oMatch.IsSet(), oMatch.GetValue(), oMatch.GetValue() != oMatch.GetValue()};
+        if (bNaNIsNoData && std::is_floating_point_v<T>)
+        {
+            oRule.mbNaN = true;
+            if (!oRule.mbNoData)
+                oRule = {true, std::numeric_limits<T>::quiet_NaN(), true};
+        }
+        oRules.push_back(oRule);
+    }
+    return oRules;
+}
+
+// Whether a valid sample could equal a value by accident: NaN equals nothing.
+template <typename T>
+bool HasValue(const std::vector<ChannelRule<T>>& oRules)
+{
+    return std::any_of(oRules.begin(), oRules.end(),
+                       [](const auto& oRule) { return oRule.mbNoData && oRule.mnValue == oRule.mnValue; });
+}
+
+// The rules of all channels, laid out as samples lie in rows: after as many vectors as there are channels it begins
+// anew.
+template <typename T>
+class Pattern
+{
+public:
+    using Samples = typename VectorsOf<T>::Samples;
+    using Bits = typename VectorsOf<T>::Bits;
+    static constexpr std::size_t LANES = VectorsOf<T>::LANES;
+
+    explicit Pattern(const std::vector<ChannelRule<T>>& oRules) : moVectors(oRules.size())
+    {
+        std::vector<T> oValues, oBeside;
+        std::vector<BitsOf<T>> oSet, oNaN;
+        for (std::size_t n = 0; n < LANES * oRules.size(); ++n)
+        {
+            const ChannelRule<T>& oRule = oRules[n % oRules.size()];
+            oValues.push_back(oRule.mnValue);
+            oBeside.push_back(Beside(oRule.mnValue));
+            oSet.push_back(static_cast<BitsOf<T>>(oRule.mbNoData ? ~BitsOf<T>(0) : BitsOf<T>(0)));
+            oNaN.push_back(static_cast<BitsOf<T>>(oRule.mbNaN ? ~BitsOf<T>(0) : BitsOf<T>(0)));
+        }
+        for (std::size_t n = 0; n < moVectors.size(); ++n)
+            moVectors[n] = {LoadVector<Samples>(&oValues[n * LANES]), LoadVector<Samples>(&oBeside[n * LANES]),
+                            LoadVector<Bits>(&oSet[n * LANES]), LoadVector<Bits>(&oNaN[n * LANES])};
+    }
+
+    // All bits set in the lanes of samples that equal their channel's value, or are NaN where that counts.
+    Bits Match(const Samples& oSamples, std::size_t nVector) const
+    {
+        Bits oFound = reinterpret_cast<Bits>(oSamples == moVectors[nVector].moValues) & moVectors[nVector].moSet;
+        if constexpr (std::is_floating_point_v<T>)
+            oFound |= reinterpret_cast<Bits>(oSamples != oSamples) & moVectors[nVector].moNaN;
+        return oFound;
+    }
+    // Lanes of valid samples that equal the value get the one beside it, lanes that are not valid the value.
+    Samples Settle(const Samples& oSamples, const Bits& oInvalid, std::size_t nVector) const
+    {
+        const Vector& oVector = moVectors[nVector];
+        const Bits oClash = reinterpret_cast<Bits>(oSamples == oVector.moValues) & oVector.moSet & ~oInvalid;
+        const Bits oKept = ~(oClash | oInvalid);
+        return reinterpret_cast<Samples>((reinterpret_cast<Bits>(oSamples) & oKept) |
+                                         (reinterpret_cast<Bits>(oVector.moBeside) & oClash) |
+                                         (reinterpret_cast<Bits>(oVector.moValues) & oInvalid));
+    }
+    std::size_t Next(std::size_t nVector) const { return nVector + 1 == moVectors.size() ? 0 : nVector + 1; }
+
+private:
+    struct Vector
+    {
+        Samples moValues;
+        Samples moBeside;
+        Bits moSet;
+        Bits moNaN;
+    };
+    std::vector<Vector> moVectors;
+};
+
+// Takes nSamples samples from the first channel on vector by vector; the last one may reach over the end, as a copy.
+template <typename T, typename Action>
+void ForVectors(const Pattern<T>& oPattern, std::size_t nSamples, const Action& oAction)
+{
+    std::size_t nVector = 0;
+    for (std::size_t n = 0; n < nSamples; n += Pattern<T>::LANES, nVector = oPattern.Next(nVector))
+        oAction(n, std::min(Pattern<T>::LANES, nSamples - n), nVector);
+}
+
+template <typename T>
+class SampleTest : public ISampleTest
+{
+public:
+    explicit SampleTest(const std::vector<ChannelRule<T>>& oRules) : moPattern(oRules) {}
+
+    bool FindsAny(const unsigned char* pSamples, std::size_t nSamples) const override
+    {
+        Bits oAny{};
+        ForVectors(moPattern, nSamples,
+                   [&](std::size_t nAt, std::size_t nCount, std::size_t nVector)
+                   { oAny |= MatchAt(pSamples + nAt * sizeof(T), nCount, nVector); });
+        const Bits oNone{};
+        return std::memcmp(&oAny, &oNone, sizeof oAny) != 0;
+    }
+
+    void Mark(const unsigned char* pSamples, std::size_t nSamples, unsigned char* pValid) const override
+    {
+        ForVectors(moPattern, nSamples,
+                   [&](std::size_t nAt, std::size_t nCount, std::size_t nVector)
+                   {
+                       const Bits oFound = MatchAt(pSamples + nAt * sizeof(T), nCount, nVector);
+                       const auto oValid =
+                           (__builtin_convertvector(oFound, typename VectorsOf<T>::Valid) & std::uint8_t(1)) ^
+                           std::uint8_t(1);
+                       std::memcpy(pValid + nAt, &oValid, nCount);
+                   });
+    }
+
+private:
+    using Bits = typename Pattern<T>::Bits;
+    using Samples = typename Pattern<T>::Samples;
+
+    Bits MatchAt(const unsigned char* pSamples, std::size_t nCount, std::size_t nVector) const
+    {
+        if (nCount == Pattern<T>::LANES)
+            return moPattern.Match(LoadVector<Samples>(pSamples), nVector);
+        Samples oSamples{};
+        std::memcpy(&oSamples, pSamples, nCount * sizeof(T));
+        Bits oFound = moPattern.Match(oSamples, nVector);
+        for (std::size_t n = nCount; n < Pattern<T>::LANES; ++n)
+            oFound[n] = 0;
+        return oFound;
+    }
+
+    Pattern<T> moPattern;
+};
+
 template <typename T>
 class ValueFinisher : public IValueFinisher
 {
 public:
-    ValueFinisher(const AuxiliaryData& oMetadata, const SourceForm& oForm, bool bNaNIsNoData)
-        : mnParts(oForm.moType.GetParts())
+    explicit ValueFinisher(const std::vector<ChannelRule<T>>& oRules)
+        : moPattern(oRules), mbChangesValid(HasValue(oRules))
     {
-        for (unsigned int nChannel = 1; nChannel <= oForm.mnChannels; ++nChannel)
-        {
-            const auto oValue = GetTypedNoData(oMetadata, nChannel);
-            const std::optional<T> oSample = oValue ? krv::gobs::ToSample<T>(*oValue) : std::nullopt;
-            Rule oRule{oSample.has_value(), oSample.value_or(T(0))};
-            if (!oSample && bNaNIsNoData && std::is_floating_point_v<T>)
-                oRule = {true, std::numeric_limits<T>::quiet_NaN()};
-            moRules.push_back(oRule);
-        }
     }
 
-    void Finish(unsigned char* pPixels, const unsigned char* pValid, std::size_t nPixels) const override
+    bool ChangesValid() const override { return mbChangesValid; }
+
+    void Finish(unsigned char* pPixels, const unsigned char* pValid, std::size_t nSamples) const override
     {
-        for (std::size_t nPixel = 0; nPixel < nPixels; ++nPixel)
-            for (const Rule& oRule : moRules)
-            {
-                FinishValue(oRule, pPixels, *pValid++ != 0);
-                pPixels += mnParts * sizeof(T);
-            }
+        ForVectors(moPattern, nSamples,
+                   [&](std::size_t nAt, std::size_t nCount, std::size_t nVector)
+                   {
+                       unsigned char* const pSamples = pPixels + nAt * sizeof(T);
+                       Samples oSamples{};
+                       Valid oValid{};
+                       if (nCount == Pattern<T>::LANES)
+                       {
+                           std::memcpy(&oSamples, pSamples, sizeof oSamples);
+                           if (pValid != nullptr)
+                               std::memcpy(&oValid, pValid + nAt, sizeof oValid);
+                       }
+                       else
+                       {
+                           std::memcpy(&oSamples, pSamples, nCount * sizeof(T));
+                           if (pValid != nullptr)
+                               std::memcpy(&oValid, pValid + nAt, nCount);
+                       }
+                       const Bits oInvalid =
+                           pValid == nullptr ? Bits{}
+                                             : reinterpret_cast<Bits>(__builtin_convertvector(oValid, Bits) == Bits{});
+                       const Samples oSettled = moPattern.Settle(oSamples, oInvalid, nVector);
+                       if (nCount == Pattern<T>::LANES)
+                           std::memcpy(pSamples, &oSettled, sizeof oSettled);
+                       else
+                           std::memcpy(pSamples, &oSettled, nCount * sizeof(T));
+                   });
     }
 
 private:
-    struct Rule
-    {
-        bool mbNoData;
-        T mnValue; // 0 without one
-    };
+    using Bits = typename Pattern<T>::Bits;
+    using Samples = typename Pattern<T>::Samples;
+    using Valid = typename VectorsOf<T>::Valid;
 
-    void FinishValue(const Rule& oRule, unsigned char* pValue, bool bValid) const
+    Pattern<T> moPattern;
+    bool mbChangesValid;
+};
+
+// The no-data value is that of the real part, the imaginary one is 0, or NaN with it.
+template <typename T>
+class ComplexFinisher : public IValueFinisher
+{
+public:
+    explicit ComplexFinisher(std::vector<ChannelRule<T>> oRules) : moRules(std::move(oRules)) {}
+
+    bool ChangesValid() const override { return HasValue(moRules); }
+
+    void Finish(unsigned char* pPixels, const unsigned char* pValid, std::size_t nValues) const override
+    {
+        for (std::size_t n = 0; n < nValues; ++n, pPixels += 2 * sizeof(T))
+            FinishValue(moRules[n % moRules.size()], pPixels, pValid == nullptr || pValid[n] != 0);
+    }
+
+private:
+    static void FinishValue(const ChannelRule<T>& oRule, unsigned char* pValue, bool bValid)
     {
         T aValue[2] = {};
-        std::memcpy(aValue, pValue, mnParts * sizeof(T));
+        std::memcpy(aValue, pValue, sizeof aValue);
         if (!bValid)
         {
             aValue[0] = oRule.mnValue;
             aValue[1] = oRule.mnValue != oRule.mnValue ? oRule.mnValue : T(0);
         }
         else if (oRule.mbNoData && aValue[0] == oRule.mnValue && aValue[1] == T(0))
-            aValue[0] = Above(aValue[0]);
+            aValue[0] = Beside(aValue[0]);
         else
             return;
-        std::memcpy(pValue, aValue, mnParts * sizeof(T));
+        std::memcpy(pValue, aValue, sizeof aValue);
     }
 
-    std::size_t mnParts;
-    std::vector<Rule> moRules;
+    std::vector<ChannelRule<T>> moRules;
 };
 
 } // namespace
 
+ISampleTest::~ISampleTest() = default;
+
 SampleValidity::SampleValidity(IRasterWriter& oWriter, const OverviewOptions& oOptions)
     : mpoPixels(oOptions.mpoValidity)
 {
+    const AuxiliaryData oMetadata = oWriter.GetAuxiliaryData();
     if (mpoPixels == nullptr)
     {
         std::unique_ptr<ValiditySource> oSource = MakeSource(oWriter);
         mnBitmap = oSource->GetBitmap();
-        if (oSource->HasNoData() || oSource->HasBitmap() || oSource->HasAlpha())
+        // Where every channel has a value of its own, its samples say all that the pixels could.
+        bool bAllSaid = true;
+        for (unsigned int nChannel = 1; nChannel <= oMetadata.GetChannelCount(); ++nChannel)
+            bAllSaid = bAllSaid && GetTypedNoData(oMetadata, nChannel).has_value();
+        if (oSource->HasBitmap() || oSource->HasAlpha() || (oSource->HasNoData() && !bAllSaid))
         {
             mpoOwned = std::move(oSource);
             mpoPixels = mpoOwned.get();
         }
     }
-    AddChannels(oWriter.GetAuxiliaryData(), oWriter.GetDataType(), oOptions.mbNaNIsNoData);
+    AddChannels(oMetadata, oWriter.GetDataType(), oOptions.mbNaNIsNoData);
 }
 
 SampleValidity::~SampleValidity() = default;
 
-// Of a single channel the source says all, as long as nobody else speaks for
-// it.
 void SampleValidity::AddChannels(const AuxiliaryData& oMetadata, const krv::gobs::DataType& oType, bool bNaN)
 {
-    const bool bAllSaid = oMetadata.GetChannelCount() == 1 && mpoOwned != nullptr;
+    if (!oType.IsComplex())
+    {
+        mpoTest = ForSampleType(oType,
+                                [&](auto nSample) -> std::unique_ptr<ISampleTest>
+                                {
+                                    using T = decltype(nSample);
+                                    const auto oRules = MakeRules<T>(oMetadata, oMetadata.GetChannelCount(), bNaN);
+                                    const bool bAny = std::any_of(oRules.begin(), oRules.end(),
+                                                                  [](const auto& oRule) { return oRule.mbNoData; });
+                                    return bAny ? std::make_unique<SampleTest<T>>(oRules) : nullptr;
+                                });
+        return;
+    }
     for (unsigned int nChannel = 1; nChannel <= oMetadata.GetChannelCount(); ++nChannel)
     {
         std::optional<NoDataValue> oValue = GetTypedNoData(oMetadata, nChannel);
         const bool bAddNaN = bNaN && oType.IsReal();
-        if ((!oValue || bAllSaid) && !bAddNaN)
+        if (!oValue && !bAddNaN)
             continue;
         if (!oValue)
             oValue = NoDataValue::FromReal(std::numeric_limits<double>::quiet_NaN());
@@ -148,32 +347,97 @@ void SampleValidity::AddChannels(const AuxiliaryData& oMetadata, const krv::gobs
 
 const unsigned char* SampleValidity::Mark(const krv::gobs::Raster& oRaster)
 {
-    const std::size_t nPixels = std::size_t{oRaster.GetWidth()} * oRaster.GetHeight();
-    const std::size_t nChannels = oRaster.GetChansCount();
-    moBytes.assign(nPixels * nChannels, 1);
+    mnValues = std::size_t{oRaster.GetWidth()} * oRaster.GetChansCount();
+    moRows.assign(oRaster.GetHeight(), 0);
+    if (mpoTest != nullptr)
+        MarkSamples(oRaster);
     if (mpoPixels != nullptr)
-    {
-        const std::unique_ptr<Mask> oMask(mpoPixels->BuildMask(oRaster));
-        for (std::size_t n = 0; n < nPixels; ++n)
-            if (!IsSet(oMask->GetBits(), n))
-                std::memset(moBytes.data() + n * nChannels, 0, nChannels);
-    }
+        MarkPixels(oRaster);
     for (const Channel& oChannel : moChannels)
-    {
-        const std::unique_ptr<Mask> oMask(oChannel.mpoNoData->BuildMask(oRaster));
-        for (std::size_t n = 0; n < nPixels; ++n)
-            if (IsSet(oMask->GetBits(), n))
-                moBytes[n * nChannels + oChannel.mnPosition] = 0;
-    }
+        MarkChannel(oRaster, oChannel);
+    return std::find(moRows.begin(), moRows.end(), 1) != moRows.end() ? FillRows() : nullptr;
+}
+
+// Rows without anything invalid are written last, and only when there are others.
+const unsigned char* SampleValidity::FillRows()
+{
+    moBytes.resize(std::max(moBytes.size(), mnValues * moRows.size()));
+    for (std::size_t nRow = 0; nRow < moRows.size(); ++nRow)
+        if (moRows[nRow] == 0)
+            std::memset(moBytes.data() + nRow * mnValues, 1, mnValues);
     return moBytes.data();
+}
+
+unsigned char* SampleValidity::GetRow(std::size_t nRow)
+{
+    moBytes.resize(std::max(moBytes.size(), mnValues * moRows.size()));
+    unsigned char* const pRow = moBytes.data() + nRow * mnValues;
+    if (moRows[nRow] == 0)
+        std::memset(pRow, 1, mnValues);
+    moRows[nRow] = 1;
+    return pRow;
+}
+
+void SampleValidity::MarkSamples(const krv::gobs::Raster& oRaster)
+{
+    const std::size_t nRowBytes = mnValues * (oRaster.GetDataType().GetValueBits() / 8);
+    for (std::size_t nRow = 0; nRow < moRows.size(); ++nRow)
+    {
+        const unsigned char* const pSamples = oRaster.GetBuffer() + nRow * nRowBytes;
+        if (mpoTest->FindsAny(pSamples, mnValues))
+            mpoTest->Mark(pSamples, mnValues, GetRow(nRow));
+    }
+}
+
+void SampleValidity::MarkPixels(const krv::gobs::Raster& oRaster)
+{
+    const std::unique_ptr<Mask> oMask(mpoPixels->BuildMask(oRaster));
+    const std::size_t nPixels = oRaster.GetWidth();
+    if (oMask->CountSet() == nPixels * moRows.size())
+        return;
+    const std::size_t nChannels = oRaster.GetChansCount();
+    for (std::size_t nRow = 0; nRow < moRows.size(); ++nRow)
+    {
+        unsigned char* pRow = moRows[nRow] != 0 ? GetRow(nRow) : nullptr;
+        for (std::size_t n = 0, nBit = nRow * nPixels; n < nPixels;)
+        {
+            if ((nBit + n) % 8 == 0 && n + 8 <= nPixels && oMask->GetBits()[(nBit + n) / 8] == 0xFF)
+            {
+                n += 8;
+                continue;
+            }
+            if (!IsSet(oMask->GetBits(), nBit + n))
+            {
+                pRow = pRow != nullptr ? pRow : GetRow(nRow);
+                std::memset(pRow + n * nChannels, 0, nChannels);
+            }
+            ++n;
+        }
+    }
+}
+
+void SampleValidity::MarkChannel(const krv::gobs::Raster& oRaster, const Channel& oChannel)
+{
+    const std::unique_ptr<Mask> oMask(oChannel.mpoNoData->BuildMask(oRaster));
+    const std::size_t nPixels = oRaster.GetWidth();
+    for (std::size_t n = 0; n < nPixels * moRows.size(); ++n)
+        if (IsSet(oMask->GetBits(), n))
+            GetRow(n / nPixels)[n % nPixels * oRaster.GetChansCount() + oChannel.mnPosition] = 0;
 }
 
 std::unique_ptr<IValueFinisher> MakeValueFinisher(const AuxiliaryData& oMetadata, const SourceForm& oForm,
                                                   bool bNaNIsNoData)
 {
+    if (!oForm.mbValidity)
+        return nullptr;
     return ForSampleType(oForm.moType,
-                         [&](auto nSample) -> std::unique_ptr<IValueFinisher> {
-                             return std::make_unique<ValueFinisher<decltype(nSample)>>(oMetadata, oForm, bNaNIsNoData);
+                         [&](auto nSample) -> std::unique_ptr<IValueFinisher>
+                         {
+                             using T = decltype(nSample);
+                             const auto oRules = MakeRules<T>(oMetadata, oForm.mnChannels, bNaNIsNoData);
+                             if (oForm.moType.IsComplex())
+                                 return std::make_unique<ComplexFinisher<T>>(oRules);
+                             return std::make_unique<ValueFinisher<T>>(oRules);
                          });
 }
 

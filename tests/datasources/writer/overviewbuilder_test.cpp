@@ -110,11 +110,14 @@ private:
             return method == "MIN" ? oBox.front() : oBox.back();
         if (method == "MODE")
         {
-            Real nBest = oBox.front();
-            for (const Real nValue : oBox)
-                if (std::count(oBox.begin(), oBox.end(), nValue) > std::count(oBox.begin(), oBox.end(), nBest))
-                    nBest = nValue;
-            return nBest;
+            auto oBest = std::pair(oBox.begin(), oBox.begin());
+            for (auto oRun = oBest; oRun.second != oBox.end();)
+            {
+                oRun = std::equal_range(oRun.second, oBox.end(), *oRun.second);
+                if (oRun.second - oRun.first > oBest.second - oBest.first)
+                    oBest = oRun;
+            }
+            return *oBest.first;
         }
         Real nSum = 0;
         Whole nWhole = 0;
@@ -330,6 +333,10 @@ TEST_F(OverviewBuilderTest, LevelsEqualTheirDefinition)
         {"AVERAGE", eDT_16S, 2, {}, false, oAll},
         {"AVERAGE", eDT_8U, 3, 2, false, oAll},
         {"AVERAGE", eDT_8U, 3, 2, true, oAll},
+        {"AVERAGE", eDT_8U, 3, 77, false, {2, 4, 8, 16, 32, 64}, 421, 333},
+        {"AVERAGE", eDT_8U, 1, {}, true, {2, 4, 64}, 421, 333},
+        {"AVERAGE", eDT_16U, 2, 1000, false, {2, 4, 8, 16, 32, 64}, 421, 333}, // blocks with and without
+        {"AVERAGE", eDT_32R, 3, 7, true, {2, 64}, 421, 333},
         {"AVERAGE", eDT_8S, 1, {}, true, oAll},
         {"AVERAGE", eDT_16U, 1, {}, false, {2, 4, 8, 16, 32, 64}, 421, 333},
         {"AVERAGE", eDT_16U, 3, {}, false, {2, 64}, 421, 333},
@@ -347,6 +354,9 @@ TEST_F(OverviewBuilderTest, LevelsEqualTheirDefinition)
         {"NEAREST", eDT_8U, 3, 2, true, oAll},
         {"NEAREST", eDT_C64R, 1, {}, false, oAll},
         {"MODE", eDT_8U, 3, 2, true, oAll},
+        {"MODE", eDT_8U, 2, {}, false, {2, 4, 8, 16, 32, 64, 128}, 301, 277},
+        {"MODE", eDT_8U, 3, 3, false, {2, 4, 5, 16, 32}, 301, 277},
+        {"MODE", eDT_16S, 1, 1, false, oAll},
         {"MODE", eDT_64R, 1, {}, false, oAll},
         {"MODE", eDT_64S, 1, {}, false, {16}},
         {"RMS", eDT_8U, 1, {}, true, oAll},
