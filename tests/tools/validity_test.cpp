@@ -1,5 +1,7 @@
 // One meaning of valid: statistics, masks, the validity query, levels, margins and pictures say the same of a value.
 
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/idataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/exacthaloreader.h"
@@ -11,6 +13,7 @@
 #include "gobs/mask/mask.h"
 #include "gobs/mask/samplematch.h"
 #include "gobs/raster/raster.h"
+#include "tests/tools/programrun.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "tools/conformance/tempfolder.h"
 #include "tools/krv/progress.h"
@@ -187,6 +190,58 @@ TEST(Validity, EverybodySaysTheSameOfAValue)
             EXPECT_EQ(BitsOf(GetTypedNoDataMaskBuilder(oRecord, eAnyChannel), *oReduced), PerBox(background));
         }
     }
+}
+
+// A channel of values, no-data 0, and alpha, with a validity mask beside them.
+TEST(Validity, MaskAndAlphaCountInStatisticsAsInLevels)
+{
+    const krv::conformance::TempFolder oFolder;
+    const std::string file = oFolder.File("alpha.tif");
+    constexpr unsigned int WIDTH = 30, HEIGHT = 22;
+    Raster oImage({WIDTH, HEIGHT, 2, eDT_8U}, {0, 0}), oMask({WIDTH, HEIGHT, 1, eDT_8U}, {0, 0});
+    std::string valid;
+    std::int64_t nValid = 0, nNoData = 0;
+    for (unsigned int n = 0; n < WIDTH * HEIGHT; ++n)
+    {
+        oImage.GetBuffer()[2 * n] = static_cast<unsigned char>(n % 7);
+        oImage.GetBuffer()[2 * n + 1] = n % 5 != 0 ? 255 : 0;
+        oMask.GetBuffer()[n] = n % 3 != 0;
+        valid += n % 7 != 0 && n % 5 != 0 && n % 3 != 0 ? '1' : '0';
+        nValid += valid.back() - '0';
+        nNoData += n % 7 == 0 ? 1 : 0;
+    }
+    {
+        BasicWriter oWriter(file, {1, 2}, "TIF", "");
+        oWriter.CreateNewFile(oImage.GetInfo());
+        oWriter.WriteRaster(&oImage);
+        AuxiliaryData oRecord(2);
+        oRecord.SetFileMetadataValue("NO_DATA_VALUE", "0");
+        oRecord.SetChanMetadataValue("ColorInterp", "Alpha", 2);
+        oWriter.SetAuxiliaryData(oRecord);
+        auto& oBitmaps = dynamic_cast<IBitmapDataset&>(*oWriter.GetDataset());
+        oBitmaps.SetBitmapDescription(oBitmaps.CreateBitmap(), "");
+        BasicWriter(&oBitmaps, {1}).WriteRaster(&oMask);
+        BuildOverviews(oWriter, {2}, "NEAREST");
+        const std::unique_ptr<IOverviewWriterAccessor> oLevels(oWriter.GetOverviewWriterAccessor());
+        const std::unique_ptr<IRasterWriter> oLevel(oLevels->CreateRasterWriter(2));
+        const std::unique_ptr<Raster> oReduced(oLevel->ReadRaster(0, 0, WIDTH / 2, HEIGHT / 2));
+        for (unsigned int n = 0; n < WIDTH / 2 * HEIGHT / 2; ++n)
+            EXPECT_EQ(oReduced->GetBuffer()[2 * n] != 0,
+                      valid[(2 * (n / (WIDTH / 2)) + 1) * WIDTH + 2 * (n % (WIDTH / 2)) + 1] == '1')
+                << n;
+        oWriter.Synchronize();
+    }
+    const auto Channels = [&file](const char* pMode)
+    {
+        return krv::test::RunKrv({"stats", file, pMode, "--json"}).Json()["channels"];
+    };
+    const auto oChannels = Channels("--channels=1,2"), oRaw = Channels("--raw");
+    EXPECT_EQ(oChannels[0]["valid"], nValid);
+    EXPECT_EQ(oChannels[0]["noData"], nNoData);
+    EXPECT_EQ(oChannels[0]["masked"], WIDTH * HEIGHT - nValid - nNoData);
+    EXPECT_TRUE(oChannels[1]["of"] == "alpha" && oChannels[1]["mean"].is_null());
+    EXPECT_EQ(oRaw[0]["valid"], WIDTH * HEIGHT - nNoData);
+    EXPECT_EQ(oRaw[1]["max"], 255);
 }
 
 } // namespace krv::tool
