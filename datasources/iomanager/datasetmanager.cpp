@@ -11,9 +11,12 @@
 #include "toolkit/xml/xmlutil.h"
 
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <array>
+#include <cerrno>
 #include <cstdio>
+#include <cstring>
 #include <fstream>
 #include <mutex>
 
@@ -58,6 +61,30 @@ bool IsSpecialFile(const std::string& name)
 {
     struct stat oStatus;
     return stat(name.c_str(), &oStatus) == 0 && !S_ISREG(oStatus.st_mode) && !S_ISBLK(oStatus.st_mode);
+}
+
+// An exception whose message is an empty text by contract. what() names the file and the cause, for programs that show
+// no more than that.
+template <typename Kind>
+class Described : public Kind
+{
+public:
+    Described(const std::string& fileName, const std::string& cause)
+        : Kind(fileName, "", krv::Place::None()), moDescription(fileName + ": " + cause)
+    {
+    }
+
+    const char* what() const noexcept override { return moDescription.c_str(); }
+
+private:
+    std::string moDescription;
+};
+
+std::string WhyUnreadable(const std::string& name)
+{
+    if (IsSpecialFile(name))
+        return "it is a folder or no regular file";
+    return access(name.c_str(), R_OK) != 0 ? std::strerror(errno) : "it cannot be read";
 }
 
 bool ReadHeader(const std::string& name, Header& oHeader)
@@ -207,8 +234,8 @@ IDataset* DatasetManager::OpenLocked(const std::string& fileName, AccessMode eMo
             return poDataset;
     }
     if (!bRead)
-        throw krv::FileNotFoundException(mungedName, "", Place::None());
-    throw krv::FileFormatException(mungedName, "", Place::None());
+        throw Described<krv::FileNotFoundException>(mungedName, WhyUnreadable(mungedName));
+    throw Described<krv::FileFormatException>(mungedName, "no format recognises it");
 }
 
 IDataset* DatasetManager::OpenRecognised(const std::string& name, const unsigned char* pHeader, AccessMode eMode,

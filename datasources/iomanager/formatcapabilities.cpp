@@ -4,6 +4,7 @@
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/debugger.h"
 #include "toolkit/xml/xmldocument.h"
+#include "toolkit/xml/xmlerror.h"
 #include "toolkit/xml/xmlutil.h"
 
 #include <xalanc/PlatformSupport/XSLException.hpp>
@@ -19,6 +20,8 @@ namespace
 {
 
 constexpr unsigned long long NO_LIMIT = std::numeric_limits<unsigned long long>::max();
+
+constexpr const char* UNKNOWN_ERROR = "An unknown error occur during the XPath evaluation"; // the wording is intended
 
 void Report(const std::string& message, std::source_location oLocation = std::source_location::current())
 {
@@ -42,11 +45,12 @@ Answer Ask(const std::string& xmlPath, const std::string& xpath, Answer oOtherwi
     }
     catch (const std::exception& oException)
     {
-        Report(oException.what());
+        // The XML parser's own exception has no words here, intended, whatever else it is.
+        Report(krv::xml::IsParseException(oException) ? UNKNOWN_ERROR : oException.what());
     }
     catch (...)
     {
-        Report("An unknown error occur during the XPath evaluation");
+        Report(UNKNOWN_ERROR);
     }
     return oOtherwise;
 }

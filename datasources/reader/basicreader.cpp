@@ -55,6 +55,10 @@ BasicReader::BasicReader(const std::string& fileName)
         RequireChannels(mpoChannels->moChannels, "No channels in dataset: file=" + fileName, oPlace);
         UseChannels(oDataset.get(), oRasterDataset, nullptr, oPlace);
     }
+    catch (const krv::Exception& oException)
+    {
+        throw krv::DataException(oException.GetMessage(), oPlace);
+    }
     catch (const std::exception& oException)
     {
         throw krv::DataException(oException.what(), oPlace);

@@ -147,6 +147,9 @@ TEST(XmlDocument, ExceptionOutlivesXmlSupport)
     catch (const xercesc::SAXParseException& oException)
     {
         oKept = oException;
+        const auto* const poStandard = dynamic_cast<const std::exception*>(&oException);
+        ASSERT_NE(poStandard, nullptr);
+        EXPECT_EQ(poStandard->what(), "text:1:3: " + XmlTranscode(oException.getMessage()));
     }
     ASSERT_TRUE(oKept.has_value());
     EXPECT_NE(XmlTranscode(oKept->getMessage()), "");

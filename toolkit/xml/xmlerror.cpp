@@ -1,9 +1,9 @@
 #include "toolkit/xml/xmlerror.h"
 
+#include "toolkit/xml/xmlexception.h"
 #include "toolkit/xml/xmlutil.h"
 
 #include <xalanc/PlatformSupport/XSLException.hpp>
-#include <xercesc/sax/SAXParseException.hpp>
 #include <xercesc/util/OutOfMemoryException.hpp>
 #include <xercesc/util/XMLException.hpp>
 
@@ -22,14 +22,6 @@ std::string OneLine(std::string text)
     return text;
 }
 
-std::string Describe(const xercesc::SAXParseException& oException)
-{
-    std::string text = XmlTranscode(oException.getSystemId());
-    if (oException.getLineNumber() > 0)
-        text += ":" + std::to_string(oException.getLineNumber()) + ":" + std::to_string(oException.getColumnNumber());
-    return (text.empty() ? text : text + ": ") + XmlTranscode(oException.getMessage());
-}
-
 std::string DescribeRaw()
 {
     try
@@ -38,7 +30,7 @@ std::string DescribeRaw()
     }
     catch (const xercesc::SAXParseException& oException)
     {
-        return Describe(oException);
+        return ParseException(oException).what();
     }
     catch (const xercesc::SAXException& oException)
     {
@@ -71,6 +63,11 @@ std::string DescribeRaw()
 std::string DescribeCurrentException()
 {
     return OneLine(DescribeRaw());
+}
+
+bool IsParseException(const std::exception& oException)
+{
+    return dynamic_cast<const ParseException*>(&oException) != nullptr;
 }
 
 } // namespace krv::xml

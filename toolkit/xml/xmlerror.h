@@ -2,6 +2,7 @@
 
 #include "toolkit/api.h"
 
+#include <exception>
 #include <string>
 
 namespace krv::xml
@@ -11,5 +12,8 @@ namespace krv::xml
 // those of the XML parser ("file:line:column: message") and of the XPath evaluation. "Unknown error" for any other. For
 // use in a catch block only, so that callers can report XML failures without the XML library's headers.
 KRV_TOOLKIT_API std::string DescribeCurrentException();
+
+// Whether an exception is the XML parser's (ParseException of xmlexception.h).
+KRV_TOOLKIT_API bool IsParseException(const std::exception& oException);
 
 } // namespace krv::xml

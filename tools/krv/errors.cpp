@@ -80,8 +80,12 @@ std::string FormatText(const krv::FileFormatException& oError)
     const std::string& file = oError.GetFileName();
     if (oError.GetMessage().empty())
         return fmt::format("{0}: no format recognises this file; try `krv doctor {0}`", file);
-    return fmt::format("{}; the file is damaged or of a kind that is not read (`krv doctor {}` tells more)",
-                       WithFile(file, oError.GetMessage()), file);
+    const std::string message = WithFile(file, oError.GetMessage());
+    const bool bSaid = message.find("is damaged") != std::string::npos || message.find("not read") != std::string::npos;
+    const char* const pGuess = message.find("truncated") != std::string::npos
+                                   ? "; the file is damaged"
+                                   : "; the file is damaged or of a kind that is not read";
+    return fmt::format("{}{} (`krv doctor {}` tells more)", message, bSaid ? "" : pGuess, file);
 }
 
 std::string LibraryText(const krv::LibraryException& oError)
@@ -201,7 +205,7 @@ std::string Describe(const std::string& file, const krv::Exception** ppError)
     }
     catch (const std::exception& oError)
     {
-        return WithFile(file, oError.what());
+        return krv::xml::IsParseException(oError) ? XmlText(oError.what()) : WithFile(file, oError.what());
     }
     catch (...)
     {

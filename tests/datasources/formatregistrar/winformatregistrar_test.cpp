@@ -39,11 +39,16 @@ std::string LoadError()
     std::string error;
     try
     {
-        error = Error([] { DatasetManager::GetInstance(); });
+        DatasetManager::GetInstance();
+    }
+    catch (const std::exception& oException) // for everybody, whether they know the XML library or not
+    {
+        error = krv::xml::IsParseException(oException) ? std::string("xml: ") + oException.what()
+                                                       : krv::test::DescribeException();
     }
     catch (...)
     {
-        return "xml: " + krv::xml::DescribeCurrentException();
+        error = krv::test::DescribeException();
     }
     const std::size_t nNumber = error.find("errno=");
     if (nNumber == std::string::npos)

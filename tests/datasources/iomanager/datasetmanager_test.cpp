@@ -79,6 +79,21 @@ protected:
 TEST_F(DatasetManagerTest, FilesThatNobodyOpens)
 {
     const std::string missing = moHome.GetFolder().File("missing.bin");
+    const auto ExpectWords = [](const std::string& name, const char* pCause)
+    {
+        try
+        {
+            delete Manager().Open(name, eReadOnly);
+            ADD_FAILURE() << name;
+        }
+        catch (const std::exception& oException)
+        {
+            EXPECT_EQ(oException.what(), name + ": " + pCause);
+        }
+    };
+    ExpectWords(missing, "No such file or directory");
+    ExpectWords(moHome.GetFolder().GetPath(), "it is a folder or no regular file");
+    ExpectWords(File("unknown"), "no format recognises it");
     for (const std::string& name : {missing, std::string(), moHome.GetFolder().GetPath()})
     {
         const auto oException = Thrown<krv::FileNotFoundException>([&] { Manager().Open(name, eReadOnly); });

@@ -1,9 +1,9 @@
 #include "toolkit/xml/detail/saxreader.h"
 
+#include "toolkit/xml/xmlexception.h"
 #include "toolkit/xml/xmlutil.h"
 
 #include <xercesc/framework/MemBufInputSource.hpp>
-#include <xercesc/sax/SAXParseException.hpp>
 #include <xercesc/sax2/XMLReaderFactory.hpp>
 #include <xercesc/util/SecurityManager.hpp>
 #include <xercesc/util/XMLUni.hpp>
@@ -62,19 +62,20 @@ std::size_t CheckedSize(int nFile, const std::string& fileName)
 
 void ThrowParseError(const std::string& message, const std::string& name)
 {
-    throw xercesc::SAXParseException(XmlTranscode(message).c_str(), nullptr, XmlTranscode(name).c_str(), 0, 0);
+    throw ParseException(
+        xercesc::SAXParseException(XmlTranscode(message).c_str(), nullptr, XmlTranscode(name).c_str(), 0, 0));
 }
 
 void ThrowingErrorHandler::warning(const xercesc::SAXParseException&) {}
 
 void ThrowingErrorHandler::error(const xercesc::SAXParseException& oException)
 {
-    throw xercesc::SAXParseException(oException);
+    throw ParseException(oException);
 }
 
 void ThrowingErrorHandler::fatalError(const xercesc::SAXParseException& oException)
 {
-    throw xercesc::SAXParseException(oException);
+    throw ParseException(oException);
 }
 
 void ThrowingErrorHandler::resetErrors() {}

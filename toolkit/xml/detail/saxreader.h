@@ -14,7 +14,7 @@
 namespace krv::xml::detail
 {
 
-// Throws the XML parser's exception with a message of ours.
+// Throws ParseException with a message of ours.
 [[noreturn]] void ThrowParseError(const std::string& message, const std::string& name);
 
 // Turns every error of the parser into its exception, and keeps it from printing.

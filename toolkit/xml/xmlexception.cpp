@@ -1,0 +1,25 @@
+#include "toolkit/xml/xmlexception.h"
+
+#include "toolkit/xml/xmlutil.h"
+
+namespace krv::xml
+{
+
+ParseException::ParseException(const xercesc::SAXParseException& oException)
+    : SAXParseException(oException), moDescription(XmlTranscode(oException.getSystemId()))
+{
+    if (getLineNumber() > 0)
+        moDescription += ":" + std::to_string(getLineNumber()) + ":" + std::to_string(getColumnNumber());
+    moDescription += (moDescription.empty() ? "" : ": ") + XmlTranscode(getMessage());
+}
+
+ParseException::ParseException(const ParseException&) = default;
+ParseException& ParseException::operator=(const ParseException&) = default;
+ParseException::~ParseException() = default;
+
+const char* ParseException::what() const noexcept
+{
+    return moDescription.c_str();
+}
+
+} // namespace krv::xml
