@@ -20,9 +20,9 @@ KRV_DATASOURCES_API krv::gobs::Mask* ReadMask(IBitmapDataset& oDataset, unsigned
                                               krv::gobs::RasterInfo& oInfo, krv::gobs::RasterContext& oContext);
 
 // Stores the centre of a mask at its position in a bitmap of a dataset that is open for update; the bits stay as they
-// are. A bitmap number below 1 makes a new bitmap. Returns the number of the bitmap. Throws DataException "Dataset is
-// not Valid." for a dataset without IDataset, "Dataset doesn't exist." for one without a file, and "Unable to create
-// bitmap, file doesn't exist." when the file has gone after that.
+// are. A bitmap number below 1 makes a new bitmap, which goes again when the mask cannot be stored. Returns the number
+// of the bitmap. Throws DataException "Dataset is not Valid." for a dataset without IDataset, "Dataset doesn't exist."
+// for one without a file, and "Unable to create bitmap, file doesn't exist." when the file has gone after that.
 KRV_DATASOURCES_API unsigned int WriteMask(IBitmapDataset& oDataset, const krv::gobs::Mask& oMask, int nBitmap);
 
 } // namespace krv::datasources

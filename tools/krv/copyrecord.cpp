@@ -101,15 +101,6 @@ std::vector<unsigned int> NumbersOfFirst(const CopyPlan& oPlan)
     return oNumbers;
 }
 
-// A reference names a file as the user would, or as it lies beside the one that refers to it.
-bool IsFile(const std::string& reference, const std::string& file)
-{
-    std::error_code oNone;
-    const std::filesystem::path oBeside = std::filesystem::path(file).parent_path() / reference;
-    return reference == file || std::filesystem::equivalent(reference, file, oNone) ||
-           std::filesystem::equivalent(oBeside, file, oNone);
-}
-
 // References to a table that is copied name the copy; others stay as they are.
 void RenumberTables(MetadataMap& oMap, std::size_t nSource, const std::string& source, const std::string& target,
                     const TableNumbers& oTables)
@@ -122,7 +113,7 @@ void RenumberTables(MetadataMap& oMap, std::size_t nSource, const std::string& s
         if (oTag == oMap.end() || !krv::datasources::ParseRefMetadataTag(oTag->second, file, layer, nNumber))
             continue;
         const auto oTable = oTables.find({nSource, nNumber});
-        if (oTable == oTables.end() || !IsFile(file, source))
+        if (oTable == oTables.end() || !IsReferenceTo(file, source))
             continue;
         const bool bBare = file.find('/') == std::string::npos;
         oTag->second = krv::datasources::BuildRefMetadataTag(

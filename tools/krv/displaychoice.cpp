@@ -80,7 +80,7 @@ std::shared_ptr<krv::gobs::PCT> TableOf(const SourceFile& oFile, unsigned int nC
     if (nChannel <= oMetadata.GetChannelCount() &&
         krv::datasources::ParseRefMetadataTag(oMetadata.GetChanMetadataValue("DEFAULT_PCT_REF", nChannel), file, layer,
                                               nWanted) &&
-        std::find(oList.begin(), oList.end(), nWanted) != oList.end())
+        IsReferenceTo(file, oFile.GetName()) && std::find(oList.begin(), oList.end(), nWanted) != oList.end())
         return std::shared_ptr<krv::gobs::PCT>(poTables->GetPCT(nWanted));
     for (const unsigned int nTable : oList)
     {

@@ -13,6 +13,8 @@
 #include <fmt/format.h>
 
 #include <algorithm>
+#include <filesystem>
+#include <system_error>
 
 namespace krv::tool
 {
@@ -45,6 +47,14 @@ bool Has(const IOverviewReaderAccessor& oAccessor, unsigned int nLevel)
 }
 
 } // namespace
+
+bool IsReferenceTo(const std::string& reference, const std::string& file)
+{
+    std::error_code oNone;
+    const std::filesystem::path oBeside = std::filesystem::path(file).parent_path() / reference;
+    return reference == file || std::filesystem::equivalent(reference, file, oNone) ||
+           std::filesystem::equivalent(oBeside, file, oNone);
+}
 
 LevelReader::LevelReader(std::unique_ptr<IRasterReader> poFull, std::unique_ptr<IOverviewReaderAccessor> poAccessor,
                          std::unique_ptr<IRasterReader> poLevel)
@@ -173,9 +183,17 @@ LevelReader SourceFile::ReadAtLeast(const std::vector<unsigned int>& oChannels, 
     {
         if (!poAccessor->IsLevelValid(nLevel))
             continue;
-        std::unique_ptr<IRasterReader> poLevel(poAccessor->CreateRasterReader(nLevel));
-        if (poLevel->GetWidth() >= nWidth && poLevel->GetHeight() >= nHeight)
-            return {std::move(poFull), std::move(poAccessor), std::move(poLevel)};
+        try
+        {
+            std::unique_ptr<IRasterReader> poLevel(poAccessor->CreateRasterReader(nLevel));
+            if (poLevel->GetWidth() >= nWidth && poLevel->GetHeight() >= nHeight)
+                return {std::move(poFull), std::move(poAccessor), std::move(poLevel)};
+        }
+        catch (const krv::Exception&)
+        {
+            krv::nspio::Warning::Warn(fmt::format("{}: level {} cannot be read: {}", moName, nLevel, CurrentMessage()),
+                                      "tools/krv/sourcefile", 0);
+        }
     }
     return {std::move(poFull), nullptr, nullptr};
 }

@@ -21,6 +21,10 @@ class IRasterReader;
 namespace krv::tool
 {
 
+// Whether a reference in metadata means a file: it names it as the user does, or as it lies beside the one that refers
+// to it.
+bool IsReferenceTo(const std::string& reference, const std::string& file);
+
 // A reader and, for a level, what it stands on.
 class LevelReader
 {

@@ -178,6 +178,8 @@ TEST_F(MaskFileTest, RealFilesKeepMasksBitForBit)
         for (std::uint64_t i = 0; i < 67 * 37; i += 3)
             oPart.SetBit(i % 67, i / 67);
         EXPECT_EQ(WriteMask(*poBitmaps, oPart, static_cast<int>(nPart)), nPart);
+        const Mask oOutside(RasterInfo(61, 33, 1, krv::gobs::eDT_BIT), RasterContext(-100000, 50));
+        EXPECT_THROW(WriteMask(*poBitmaps, oOutside, 0), krv::Exception); // and leaves no bitmap behind, see below
         poDataset->Synchronize();
         poDataset.reset();
 
