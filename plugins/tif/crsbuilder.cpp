@@ -1,6 +1,7 @@
 #include "plugins/tif/crsbuilder.h"
 
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/ogc/cs/coordinatetransformation.h"
 
 #include <array>
 #include <charconv>
@@ -94,6 +95,27 @@ std::string ProjectedText(const std::string& name, const std::string& base, cons
            ",\"conversion\":" + conversion + "," + axes + "}";
 }
 
+// The definition that a citation holds: up to the bracket that ends it, since other parts may follow.
+std::string CutDefinition(const std::string& citation)
+{
+    const auto nPrefix = citation.find(TEXT_PREFIX);
+    if (nPrefix == std::string::npos)
+        return {};
+    const std::string text = citation.substr(nPrefix + TEXT_PREFIX.size());
+    int nDepth = 0;
+    bool bQuoted = false;
+    for (std::size_t nAt = 0; nAt < text.size(); ++nAt)
+    {
+        bQuoted = bQuoted != (text[nAt] == '"');
+        const bool bOpen = text[nAt] == '[' || text[nAt] == '{';
+        const bool bClose = text[nAt] == ']' || text[nAt] == '}';
+        nDepth += bQuoted || bOpen == bClose ? 0 : bOpen ? 1 : -1;
+        if (!bQuoted && bClose && nDepth == 0)
+            return text.substr(0, nAt + 1);
+    }
+    return text;
+}
+
 // Cuts a nested "VERTCS[...]" out of a definition and returns it; "" when there is none.
 std::string CutHeights(std::string& definition)
 {
@@ -111,6 +133,28 @@ std::string CutHeights(std::string& definition)
         return heights;
     }
     return {};
+}
+
+// Definitions of projections that nobody knows are taken as they stand; nothing can be computed by them, not even where
+// the false origin lies.
+bool CanBeUsed(const ICRS& oSystem)
+{
+    double nX = 0.0;
+    double nY = 0.0;
+    for (const ProjectionParameter& oParameter : oSystem.GetProjectionParameters())
+        if (oParameter.name.ends_with("asting"))
+            nX = oParameter.value;
+        else if (oParameter.name.ends_with("orthing"))
+            nY = oParameter.value;
+    try
+    {
+        return CoordinateTransformation(oSystem, *CreateCRSFromEPSG(EPSG_WGS84)).Transform(nX, nY) &&
+               std::abs(nX) <= 360.0 && std::abs(nY) <= 90.0;
+    }
+    catch (const krv::DataException&)
+    {
+        return false;
+    }
 }
 
 std::unique_ptr<ICRS> Compound(const ICRS& oHorizontal, const ICRS& oVertical, const krv::Place& oPlace)
@@ -149,25 +193,37 @@ std::string ShiftText(const std::vector<double>& oShift)
 
 } // namespace
 
-CRSBuilder::CRSBuilder(const GeoKeyDirectory& oKeys, const krv::Place& oPlace) : moKeys(oKeys), moPlace(oPlace) {}
+CRSBuilder::CRSBuilder(const GeoKeyDirectory& oKeys, const krv::Place& oPlace) : moKeys(oKeys), moPlace(oPlace)
+{
+    ReadDefinition();
+}
 
 std::unique_ptr<ICRS> CRSBuilder::Build() const
 {
+    if (!FindContradiction().empty())
+        return nullptr;
     CRS poSystem = BuildFromText();
     if (!poSystem)
         poSystem = BuildHorizontal();
     return poSystem ? WithHeights(std::move(poSystem)) : nullptr;
 }
 
-int CRSBuilder::FindModel() const
+// The model that the keys state, by its key or by naming a projection; 0 when they leave it open. A base system alone
+// leaves it open.
+int CRSBuilder::FindStatedModel() const
 {
     const int nModel = moKeys.GetCode(GTModelTypeGeoKey);
     if (nModel == ModelTypeProjected || nModel == ModelTypeGeographic || nModel == ModelTypeGeocentric)
         return nModel;
-    if (moKeys.HasCode(ProjectedCSTypeGeoKey) || moKeys.HasCode(ProjectionGeoKey) ||
-        moKeys.HasCode(ProjCoordTransGeoKey))
-        return ModelTypeProjected;
-    return moKeys.HasCode(GeographicTypeGeoKey) ? ModelTypeGeographic : 0;
+    const bool bProjected = moKeys.HasCode(ProjectedCSTypeGeoKey) || moKeys.HasCode(ProjectionGeoKey) ||
+                            moKeys.HasCode(ProjCoordTransGeoKey);
+    return bProjected ? int{ModelTypeProjected} : 0;
+}
+
+int CRSBuilder::FindModel() const
+{
+    const int nModel = FindStatedModel();
+    return nModel == 0 && moKeys.HasCode(GeographicTypeGeoKey) ? int{ModelTypeGeographic} : nModel;
 }
 
 CRSBuilder::CRS CRSBuilder::BuildHorizontal() const
@@ -186,22 +242,106 @@ CRSBuilder::CRS CRSBuilder::BuildHorizontal() const
 }
 
 // Some writers put the whole definition as text into a citation when the keys cannot say it.
-CRSBuilder::CRS CRSBuilder::BuildFromText() const
+void CRSBuilder::ReadDefinition()
 {
-    if (moKeys.HasCode(ProjectedCSTypeGeoKey) || moKeys.HasCode(GeographicTypeGeoKey))
-        return nullptr;
+    if (moKeys.HasCode(ProjectedCSTypeGeoKey))
+        return;
     for (const geokey_t eKey : {PCSCitationGeoKey, GTCitationGeoKey, GeogCitationGeoKey})
     {
-        std::string text = moKeys.GetText(eKey);
-        if (!text.starts_with(TEXT_PREFIX))
+        std::string text = CutDefinition(moKeys.GetText(eKey));
+        if (text.empty())
             continue;
-        text.erase(0, TEXT_PREFIX.size());
-        const std::string heights = CutHeights(text);
-        CRS poSystem = CreateCRSFromWKT(text, moPlace);
-        return heights.empty() ? std::move(poSystem)
-                               : Compound(*poSystem, *CreateCRSFromWKT(heights, moPlace), moPlace);
+        moDefinition.emplace(Definition{eKey, text, nullptr, {}});
+        try
+        {
+            const std::string heights = CutHeights(text);
+            CRS poSystem = CreateCRSFromWKT(text, moPlace);
+            moDefinition->system = heights.empty() ? std::move(poSystem)
+                                                   : Compound(*poSystem, *CreateCRSFromWKT(heights, moPlace), moPlace);
+        }
+        catch (const krv::DataException& oException)
+        {
+            moDefinition->cause = oException.GetMessage();
+        }
+        return;
     }
-    return nullptr;
+}
+
+// A geographic system in the citation of the base of a projected one.
+bool CRSBuilder::IsBaseDefinition() const
+{
+    return moDefinition && moDefinition->eKey == GeogCitationGeoKey && moDefinition->system &&
+           moDefinition->system->IsGeographic() && FindStatedModel() == ModelTypeProjected;
+}
+
+CRSBuilder::CRS CRSBuilder::BuildFromText() const
+{
+    const int nModel = FindStatedModel();
+    const bool bCode = moKeys.HasCode(ProjectedCSTypeGeoKey) ||
+                       (nModel == ModelTypeGeographic && moKeys.HasCode(GeographicTypeGeoKey));
+    if (!moDefinition || bCode || IsBaseDefinition())
+        return nullptr;
+    const bool bSaidByKeys = moKeys.HasCode(ProjectionGeoKey) || moKeys.HasCode(ProjCoordTransGeoKey);
+    if (bSaidByKeys && !(moDefinition->system && CanBeUsed(*moDefinition->system)))
+        return nullptr;
+    if (moDefinition->system)
+        return CRS(moDefinition->system->Clone());
+    throw krv::DataException(moDefinition->cause, moPlace);
+}
+
+std::string CRSBuilder::FindContradiction() const
+{
+    const int nModel = FindStatedModel();
+    const bool bCode = moKeys.HasCode(ProjectedCSTypeGeoKey);
+    if (nModel == ModelTypeGeographic && bCode)
+        return "their model is geographic, and they name a projected system";
+    const bool bText = moDefinition && moDefinition->system && !bCode && !IsBaseDefinition();
+    if (!bText)
+    {
+        const bool bBase = nModel == 0 && moKeys.HasCode(GeographicTypeGeoKey);
+        const std::optional<EPSGUnit> oUnit = FindMapUnit();
+        const bool bMap = moKeys.GetCode(ProjectedCSTypeGeoKey) == KvUserDefined || (oUnit && oUnit->isLinear);
+        return bBase && bMap ? "they describe a map in a projection that they do not name" : "";
+    }
+    const bool bProjected = moDefinition->system->IsProjected();
+    if (nModel == ModelTypeProjected && !bProjected)
+        return "their model is projected, the definition in their text is not";
+    if (nModel == ModelTypeGeographic && !moDefinition->system->IsGeographic())
+        return "their model is geographic, the definition in their text is not";
+    return CompareUnits();
+}
+
+// Of the map: the key against the definition. Feet of different countries count as one here, the definition knows
+// better.
+std::string CRSBuilder::CompareUnits() const
+{
+    constexpr double ROUNDING = 1e-5;
+    const ICRS& oSystem = *moDefinition->system;
+    const std::optional<EPSGUnit> oUnit = FindMapUnit();
+    const bool bSame = oUnit && std::abs(oUnit->factor / oSystem.GetUnitFactor() - 1.0) < ROUNDING;
+    const bool bOther = oSystem.IsProjected()    ? oUnit && !(oUnit->isLinear && bSame)
+                        : oSystem.IsGeographic() ? oUnit && oUnit->isLinear && FindStatedModel() == 0
+                                                 : false;
+    return bOther ? "their unit is the " + oUnit->name + ", that of the definition in their text the " +
+                        oSystem.GetUnitName()
+                  : std::string();
+}
+
+// The unit of the map, where the keys give one that is known.
+std::optional<EPSGUnit> CRSBuilder::FindMapUnit() const
+{
+    try
+    {
+        if (moKeys.HasCode(ProjLinearUnitsGeoKey))
+            return FindEPSGUnit(moKeys.GetCode(ProjLinearUnitsGeoKey), moPlace);
+    }
+    catch (const krv::DataException&)
+    {
+        return std::nullopt;
+    }
+    const std::optional<double> oSize = moKeys.GetNumber(ProjLinearUnitSizeGeoKey);
+    return oSize ? std::optional(EPSGUnit{"length of " + Number(*oSize) + " metres", *oSize, false, true})
+                 : std::nullopt;
 }
 
 CRSBuilder::CRS CRSBuilder::BuildProjected() const
@@ -275,7 +415,8 @@ std::string CRSBuilder::Conversion() const
     if (moKeys.HasCode(ProjectionGeoKey))
         return DescribeEPSGPart(eEPSG_Conversion, moKeys.GetCode(ProjectionGeoKey), moPlace);
     const int nMethod = moKeys.GetCode(ProjCoordTransGeoKey);
-    const ProjectionRule* poRule = FindProjectionRule(nMethod, UsesSecondVariant(nMethod));
+    const ProjectionRule* poRule =
+        IsPseudoMercator() ? &GetPseudoMercatorRule() : FindProjectionRule(nMethod, UsesSecondVariant(nMethod));
     if (poRule == nullptr)
         Fail(nMethod == 0 ? "they name no projection"
                           : "projection method " + std::to_string(nMethod) + " is not known");
@@ -338,6 +479,8 @@ std::string CRSBuilder::BaseSystem() const
 {
     if (moKeys.HasCode(GeographicTypeGeoKey))
         return DescribeEPSGPart(eEPSG_CRS, moKeys.GetCode(GeographicTypeGeoKey), moPlace);
+    if (IsBaseDefinition())
+        return moDefinition->system->GetPROJJSON();
     const std::string unit = AngleUnit();
     const std::string axes =
         Axis("Geodetic latitude", "Lat", "north", unit) + "," + Axis("Geodetic longitude", "Lon", "east", unit);
@@ -474,6 +617,24 @@ std::string CRSBuilder::ProjectedName() const
 {
     const std::string name = NamedPart(PCSCitationGeoKey, "PCS Name");
     return name == "unknown" ? NamedPart(GTCitationGeoKey, "PCS Name") : name;
+}
+
+// The keys have no method for the spherical projection of web maps: their writers say a plain Mercator there and mean
+// what the name says.
+bool CRSBuilder::IsPseudoMercator() const
+{
+    if (moKeys.GetCode(ProjCoordTransGeoKey) != CT_Mercator)
+        return false;
+    constexpr geokey_t ZEROS[] = {ProjNatOriginLatGeoKey, ProjNatOriginLongGeoKey, ProjStdParallel1GeoKey,
+                                  ProjFalseEastingGeoKey, ProjFalseNorthingGeoKey};
+    for (const geokey_t eKey : ZEROS)
+        if (moKeys.GetNumber(eKey).value_or(0.0) != 0.0)
+            return false;
+    const std::string name = ProjectedName();
+    const bool bNamed = name.find("Web_Mercator") != std::string::npos ||
+                        name.find("Web Mercator") != std::string::npos ||
+                        name.find("Pseudo-Mercator") != std::string::npos;
+    return bNamed && moKeys.GetNumber(ProjScaleAtNatOriginGeoKey).value_or(1.0) == 1.0;
 }
 
 void CRSBuilder::Fail(const std::string& cause) const

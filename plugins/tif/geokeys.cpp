@@ -93,12 +93,19 @@ std::vector<TiePoint> ReadTiePoints(TIFF* poFile)
     return oPoints;
 }
 
-std::unique_ptr<krv::ogc::cs::ICRS> ReadCRS(TIFF* poFile, const krv::Place& oPlace)
+std::unique_ptr<krv::ogc::cs::ICRS> ReadCRS(TIFF* poFile, std::string* pTrouble, const krv::Place& oPlace)
 {
     try
     {
         const std::unique_ptr<GeoKeyDirectory> poKeys = GeoKeyDirectory::Read(poFile);
-        return poKeys ? CRSBuilder(*poKeys, oPlace).Build() : nullptr;
+        if (!poKeys)
+            return nullptr;
+        const CRSBuilder oBuilder(*poKeys, oPlace);
+        const std::string contradiction = oBuilder.FindContradiction();
+        if (pTrouble != nullptr && !contradiction.empty())
+            *pTrouble = "the geographic keys contradict each other, and no reference system is taken from them: " +
+                        contradiction;
+        return oBuilder.Build();
     }
     catch (const krv::DataException& oException)
     {

@@ -5,6 +5,7 @@
 #include "toolkit/ogc/cs/icrs.h"
 
 #include <memory>
+#include <string>
 #include <vector>
 
 #include <tiffio.h>
@@ -43,8 +44,10 @@ std::vector<TiePoint> ReadTiePoints(TIFF* poFile);
 
 // The reference system that the geographic keys define. A code of the EPSG database wins over whatever other keys say
 // of the same thing; everything user-defined is built from its parts. Null when there are no keys, or none that name a
-// system. Throws krv::DataException with the file's name and the cause for damaged keys, for codes that are not known,
-// and for definitions that are incomplete or cannot be expressed.
-std::unique_ptr<krv::ogc::cs::ICRS> ReadCRS(TIFF* poFile, const krv::Place& oPlace = krv::Place::Current());
+// system, and when they contradict each other; what contradicts what goes to pTrouble then. Throws krv::DataException
+// with the file's name and the cause for damaged keys, for codes that are not known, and for definitions that are
+// incomplete or cannot be expressed.
+std::unique_ptr<krv::ogc::cs::ICRS> ReadCRS(TIFF* poFile, std::string* pTrouble = nullptr,
+                                            const krv::Place& oPlace = krv::Place::Current());
 
 } // namespace krv::plugins::tif

@@ -157,6 +157,9 @@ constexpr ProjectionRule SECOND_RULES[] = {
      {POLE_PARALLEL, POLE_LONGITUDE, EASTING, NORTHING}},
 };
 
+constexpr ProjectionRule PSEUDO_MERCATOR = {
+    CT_Mercator, "Popular Visualisation Pseudo Mercator", 1024, {LATITUDE, LONGITUDE, EASTING, NORTHING}};
+
 template <std::size_t N>
 const ProjectionRule* Find(const ProjectionRule (&oRules)[N], int nMethod)
 {
@@ -171,6 +174,11 @@ const ProjectionRule* Find(const ProjectionRule (&oRules)[N], int nMethod)
 const ProjectionRule* FindProjectionRule(int nMethod, bool bSecond)
 {
     return bSecond ? Find(SECOND_RULES, nMethod) : Find(RULES, nMethod);
+}
+
+const ProjectionRule& GetPseudoMercatorRule()
+{
+    return PSEUDO_MERCATOR;
 }
 
 const ProjectionRule* FindProjectionRule(const std::string& name)

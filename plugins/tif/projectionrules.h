@@ -42,6 +42,9 @@ struct ProjectionRule
 // stereographic with a parallel of true scale away from the pole.
 const ProjectionRule* FindProjectionRule(int nMethod, bool bSecond);
 
+// The spherical Mercator projection of web maps, which the keys cannot tell from the plain one.
+const ProjectionRule& GetPseudoMercatorRule();
+
 // The rule of a method by its name in the EPSG database; null when the keys cannot say it.
 const ProjectionRule* FindProjectionRule(const std::string& name);
 

@@ -385,6 +385,82 @@ TEST(GeoKeys, UnitsEllipsoidsAndShiftsAreTakenAsTheyStand)
     EXPECT_EQ(CRSOf(Keys().Code(ProjectedCSTypeGeoKey, 32632))->GetEPSG(), 32632); // no model key
 }
 
+// What stands as text in a citation counts beside the code of a base, and what contradicts itself gives nothing.
+TEST(GeoKeys, ADefinitionInACitationCountsUnlessTheKeysContradictIt)
+{
+    const std::string base = "GEOGCS[\"GCS_WGS_1984\",DATUM[\"D_WGS_1984\",SPHEROID[\"WGS_1984\",6378137.0,"
+                             "298.257223563]],PRIMEM[\"Greenwich\",0.0],UNIT[\"Degree\",0.0174532925199433]]";
+    const auto Map = [&](const std::string& method, const std::string& unit)
+    {
+        return "ESRI PE String = PROJCS[\"WGS_1984_Web_Mercator_Auxiliary_Sphere\"," + base + ",PROJECTION[\"" +
+               method +
+               "\"],PARAMETER[\"False_Easting\",0.0],PARAMETER[\"False_Northing\",0.0],PARAMETER[\"Central_Meridian\","
+               "0.0],PARAMETER[\"Standard_Parallel_1\",0.0],UNIT[" +
+               unit + "]]";
+    };
+    const std::string web = Map("Mercator_Auxiliary_Sphere", "\"Meter\",1.0"), foot = "\"Foot_US\",0.3048006096";
+    const std::string unknown = Map("Nobodys_Projection", "\"Meter\",1.0"), plain = "ESRI PE String = " + base,
+                      broken = "ESRI PE String = PROJCS[";
+    struct Case
+    {
+        int model, base, method, unit; // 0: absent
+        int key;                       // of the text
+        std::string text;
+        const char* expected; // an EPSG code, or a part of the complaint or of the exception
+        int code = KvUserDefined;
+    };
+    const Case CASES[] = {
+        {KvUserDefined, 4326, 0, 9001, PCSCitationGeoKey, web, "3857"},
+        {0, 4326, 0, 0, GTCitationGeoKey, web + "|PCS Name = x", "3857"},
+        {1, 4326, CT_Mercator, 9001, PCSCitationGeoKey, web, "3857"},
+        {1, 4326, CT_Mercator, 9001, GTCitationGeoKey, "WGS_1984_Web_Mercator_Auxiliary_Sphere", "3857"},
+        {1, 4326, CT_Mercator, 9001, GTCitationGeoKey, "a Mercator", "3395"},
+        {1, 4326, CT_Mercator, 9001, PCSCitationGeoKey, unknown, "3395"},
+        {1, 4326, 0, 9001, PCSCitationGeoKey, web, "32632", 32632},
+        {KvUserDefined, 4326, 0, 9003, PCSCitationGeoKey, Map("Mercator_Auxiliary_Sphere", foot), "own"},
+        {KvUserDefined, 4326, 0, 9001, PCSCitationGeoKey, Map("Mercator_Auxiliary_Sphere", foot), "unit is the metre"},
+        {KvUserDefined, 4326, 0, 9102, PCSCitationGeoKey, web, "unit is the degree"},
+        {1, 4326, CT_Mercator, 9001, PCSCitationGeoKey, broken, "3395"},
+        {KvUserDefined, 4326, 0, 9001, PCSCitationGeoKey, broken, "do not name"},
+        {KvUserDefined, 4326, 0, 9001, GTCitationGeoKey, "Web Mercator", "do not name"},
+        {2, 4326, 0, 9001, PCSCitationGeoKey, web, "model is geographic"},
+        {2, 4326, 0, 0, GTCitationGeoKey, "none", "name a projected system", 32632},
+        {2, 4326, 0, 9001, GeogCitationGeoKey, plain, "4326", 0},
+        {2, 0, 0, 0, GTCitationGeoKey, plain, "4326", 0},
+        {1, 0, CT_Mercator, 9001, GeogCitationGeoKey, plain, "3395"},
+        {1, 0, 0, 9001, PCSCitationGeoKey, plain, "model is projected"},
+        {0, 0, 0, 9001, GTCitationGeoKey, plain, "unit is the metre", 0},
+        {1, 4326, 0, 9001, PCSCitationGeoKey, broken, "cannot be understood"}};
+    for (const Case& oCase : CASES)
+    {
+        SCOPED_TRACE(oCase.text.substr(0, 40) + " " + oCase.expected);
+        Keys oKeys;
+        for (const auto& [nKey, nValue] : {std::pair<int, int>{GTModelTypeGeoKey, oCase.model},
+                                           {GeographicTypeGeoKey, oCase.base},
+                                           {ProjCoordTransGeoKey, oCase.method},
+                                           {ProjLinearUnitsGeoKey, oCase.unit},
+                                           {ProjectedCSTypeGeoKey, oCase.code}})
+            if (nValue != 0)
+                oKeys.Code(nKey, nValue);
+        oKeys.Text(oCase.key, oCase.text);
+        const TiffFile poFile = NewTiff();
+        SetKeys(poFile.get(), oKeys.Directory(), oKeys.Doubles(), oKeys.Ascii());
+        std::string trouble;
+        std::unique_ptr<ICRS> poCRS;
+        const std::string error = krv::test::Error([&] { poCRS = ReadCRS(poFile.get(), &trouble); });
+        const int nCode = std::atoi(oCase.expected);
+        EXPECT_EQ(poCRS != nullptr, nCode != 0 || oCase.expected == std::string("own"));
+        if (nCode != 0 && poCRS)
+        {
+            EXPECT_TRUE(poCRS->IsEquivalent(*CreateCRSFromEPSG(nCode))) << poCRS->GetWKT();
+        }
+        else if (poCRS)
+            EXPECT_NEAR(poCRS->GetUnitFactor(), 0.3048006096, 1e-9);
+        else
+            EXPECT_THAT(trouble + error, HasSubstr(oCase.expected));
+    }
+}
+
 TEST(GeoKeys, HeightsMakeACompoundThatKeepsTheCodeOfItsPixels)
 {
     struct Case
