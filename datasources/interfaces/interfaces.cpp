@@ -12,6 +12,7 @@
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/ioverviewio.h"
 #include "datasources/interfaces/ioverviewmanager.h"
+#include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
@@ -33,6 +34,7 @@ IMathModelDataset::~IMathModelDataset() = default;
 IOverviewIO::~IOverviewIO() = default;
 IOverviewManager::~IOverviewManager() = default;
 IPCTDataset::~IPCTDataset() = default;
+IPagedDataset::~IPagedDataset() = default;
 IRasterDataset::~IRasterDataset() = default;
 IRasterIO::~IRasterIO() = default;
 IStorageDataset::~IStorageDataset() = default;

@@ -200,13 +200,14 @@ void ReadItems(TIFF* poTiff, AuxiliaryData& oData, std::string* pTrouble)
     krv::xml::Element oRoot;
     try
     {
-        oRoot = krv::xml::ParseTree(text.data(), text.size(), std::string(TIFFFileName(poTiff)) + ", tag 42112");
+        oRoot = krv::xml::ParseTree(text.data(), text.size(), "tag 42112");
     }
     catch (const krv::DataException& oException)
     {
         // Nothing is lost when another program wrote something else there.
         if (pTrouble != nullptr)
-            *pTrouble = oException.what();
+            *pTrouble = "tag 42112 (metadata, descriptions, states of levels) cannot be read: " +
+                        std::string(oException.what());
         return SetText(oData, "MetadataXML", text);
     }
     std::map<unsigned int, krv::datasources::MetadataMap> oMaps;

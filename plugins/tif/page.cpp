@@ -129,7 +129,20 @@ Page::~Page() = default;
 
 void Page::Fail(const std::string& what, const Place& oPlace) const
 {
-    throw FileFormatException(GetFileName(), GetFileName() + ": " + what, oPlace);
+    ThrowDamaged(GetFileName(), what, oPlace);
+}
+
+void Page::Refuse(const std::string& what, const Place& oPlace) const
+{
+    throw FileFormatException(GetFileName(), GetFileName() + ": " + what + "; the file is of a kind that is not read",
+                              oPlace);
+}
+
+void Page::Fail(const std::string& where, const TiffTrouble& oTrouble, const Place& oPlace) const
+{
+    if (oTrouble.mbUnknownKind)
+        Refuse(where + "its compression " + CodecName(moForm.mnCompression), oPlace);
+    Fail(where + (oTrouble.moCause.empty() ? "its data make no sense" : oTrouble.moCause), oPlace);
 }
 
 std::span<const unsigned char> Page::GetJpegTables() const
@@ -185,10 +198,10 @@ void Page::CheckNumbers()
     const auto oFormats = moDirectory.GetNumbers(moReader, TIFFTAG_SAMPLEFORMAT, nChannels);
     for (const auto* poValues : {&oBits, &oFormats})
         if (std::adjacent_find(poValues->begin(), poValues->end(), std::not_equal_to()) != poValues->end())
-            Fail("the channels differ in their type, which cannot be read");
+            Refuse("the channels differ in their type");
     const std::uint64_t nBits = oBits.empty() ? 1 : oBits.front();
     if (nBits == 0 || nBits > UINT16_MAX)
-        Fail("samples of " + std::to_string(nBits) + " bits cannot be read");
+        Refuse("samples of " + std::to_string(nBits) + " bits");
     const bool bSeparate = Number(TIFFTAG_PLANARCONFIG, PLANARCONFIG_CONTIG) == PLANARCONFIG_SEPARATE;
     const bool bTiled = moDirectory.Find(TIFFTAG_TILEWIDTH) != nullptr;
     CheckRow((bTiled ? nTileWidth : nWidth) * nBits / 8 * (bSeparate ? 1 : nChannels));
@@ -196,15 +209,18 @@ void Page::CheckNumbers()
 
 void Page::CheckExtent(const char* pWhat, std::uint64_t nWidth, std::uint64_t nHeight) const
 {
-    if (nWidth == 0 || nHeight == 0 || nWidth > INT_MAX || nHeight > INT_MAX)
-        Fail("the " + std::string(pWhat) + " size " + std::to_string(nWidth) + " x " + std::to_string(nHeight) +
-             " is out of range");
+    const std::string text = "the " + std::string(pWhat) + " size " + std::to_string(nWidth) + " x " +
+                             std::to_string(nHeight) + " is out of range";
+    if (nWidth == 0 || nHeight == 0)
+        Fail(text);
+    if (nWidth > INT_MAX || nHeight > INT_MAX)
+        Refuse(text);
 }
 
 void Page::CheckRow(std::uint64_t nBytes) const
 {
     if (nBytes > MAXIMUM_ROW_BYTES)
-        Fail("a row of " + std::to_string(nBytes) + " bytes is too long");
+        Refuse("a row of " + std::to_string(nBytes) + " bytes is too long");
 }
 
 void Page::ReadForm()
@@ -227,7 +243,7 @@ void Page::ReadForm()
     if (!FindSampleForm(GetTag<std::uint16_t>(poTiff, TIFFTAG_BITSPERSAMPLE, 1),
                         GetTag<std::uint16_t>(poTiff, TIFFTAG_SAMPLEFORMAT, SAMPLEFORMAT_UINT), moForm.moSample,
                         reason))
-        Fail(reason);
+        Refuse(reason);
 }
 
 void Page::ReadGeometry()
@@ -239,7 +255,7 @@ void Page::ReadGeometry()
     CheckExtent("image", moForm.mnWidth, moForm.mnHeight);
     if (GetTag<std::uint32_t>(poTiff, TIFFTAG_IMAGEDEPTH, 1) > 1 ||
         GetTag<std::uint32_t>(poTiff, TIFFTAG_TILEDEPTH, 1) > 1)
-        Fail("volumes (image depth above 1) cannot be read");
+        Refuse("volumes (image depth above 1)");
     if (moForm.mbTiled)
     {
         moForm.mnStrileWidth = GetTag<std::uint32_t>(poTiff, TIFFTAG_TILEWIDTH, 0);
@@ -261,20 +277,19 @@ void Page::CheckCodec()
     const std::uint16_t nCompression = moForm.mnCompression;
     const SampleForm& oSample = moForm.moSample;
     if (nCompression == COMPRESSION_OJPEG)
-        Fail("old-style JPEG compression cannot be read correctly");
+        Refuse("old-style JPEG compression");
     if (TIFFIsCODECConfigured(nCompression) == 0)
-        Fail("the compression " + CodecName(nCompression) + " is not supported");
+        Refuse("the compression " + CodecName(nCompression));
     if (!FitsCodec(nCompression, oSample.GetBits(), moForm.GetPlaneChannels()))
-        Fail("the compression " + CodecName(nCompression) + " does not go with samples of " +
-             std::to_string(oSample.GetBits()) + " bits and " + std::to_string(moForm.GetPlaneChannels()) +
-             " channels");
+        Refuse("the compression " + CodecName(nCompression) + " does not go with samples of " +
+               std::to_string(oSample.GetBits()) + " bits and " + std::to_string(moForm.GetPlaneChannels()) +
+               " channels");
     if (HasPredictor(nCompression))
         CheckPredictor();
     // The library turns samples round as a whole where their parts are meant.
     const bool bOddParts = oSample.mnParts == 2 && (oSample.mnPartBits <= 12 || oSample.meWidening == Widening::eHalf);
     if (bOddParts && moForm.mbBigEndian && oSample.GetBits() % 8 == 0 && !moForm.IsOwnCodec())
-        Fail("big-endian complex samples of " + std::to_string(oSample.GetBits()) +
-             " bits in this compression cannot be read correctly");
+        Refuse("big-endian complex samples of " + std::to_string(oSample.GetBits()) + " bits in this compression");
 }
 
 void Page::CheckPredictor() const
@@ -283,11 +298,23 @@ void Page::CheckPredictor() const
     const bool bWord =
         oSample.GetBits() == 8 || oSample.GetBits() == 16 || oSample.GetBits() == 32 || oSample.GetBits() == 64;
     const bool bReal = oSample.moNativeType.IsReal() && oSample.mnParts == 1;
-    const bool bKnown = moForm.mnPredictor == PREDICTOR_NONE || (moForm.mnPredictor == PREDICTOR_HORIZONTAL && bWord) ||
-                        (moForm.mnPredictor == PREDICTOR_FLOATINGPOINT && bReal);
-    if (!bKnown)
-        Fail("predictor " + std::to_string(moForm.mnPredictor) + " does not go with samples of " +
-             std::to_string(oSample.GetBits()) + " bits of this kind");
+    const std::string samples =
+        oSample.moNativeType.Describe() + " samples of " + std::to_string(oSample.GetBits()) + " bits";
+    switch (moForm.mnPredictor)
+    {
+    case PREDICTOR_NONE:
+        return;
+    case PREDICTOR_HORIZONTAL:
+        if (!bWord)
+            Refuse("predictor 2 (differences) with " + samples);
+        return;
+    case PREDICTOR_FLOATINGPOINT:
+        if (!bReal)
+            Refuse("predictor 3 (bytes of reals) with " + samples);
+        return;
+    default:
+        Refuse("predictor " + std::to_string(moForm.mnPredictor) + ", which no reader knows,");
+    }
 }
 
 void Page::CheckPhotometric()
@@ -296,10 +323,10 @@ void Page::CheckPhotometric()
     {
     case PHOTOMETRIC_LOGL:
     case PHOTOMETRIC_LOGLUV:
-        Fail("logarithmic luminance (LogL, LogLuv) cannot be read correctly");
+        Refuse("logarithmic luminance (LogL, LogLuv)");
     case PHOTOMETRIC_YCBCR:
         if (moForm.mnCompression != COMPRESSION_JPEG || moForm.mbSeparate || moForm.mnChannels != 3)
-            Fail("YCbCr pixels can be read only when they are compressed by JPEG and pixel interleaved");
+            Refuse("YCbCr pixels that are not compressed by JPEG, or not pixel interleaved");
         TIFFSetField(GetTiff(), TIFFTAG_JPEGCOLORMODE, JPEGCOLORMODE_RGB);
         break;
     default:
@@ -312,14 +339,13 @@ void Page::CheckSizes() const
     // The smallest part that is handled as a whole: a tile, or a row of a strip.
     CheckRow(std::max(moForm.GetRowBytes(moForm.mnStrileWidth), moForm.GetStoredRowBytes(moForm.mnStrileWidth)));
     if (moForm.GetStriles() > UINT32_MAX)
-        Fail("there are too many strips or tiles");
+        Refuse("there are too many strips or tiles");
     if (moForm.mnCompression == COMPRESSION_NONE)
         return;
     const std::uint64_t nExpected = moForm.GetStoredRowBytes(moForm.mnStrileWidth);
     const auto nClaimed = moForm.mbTiled ? TIFFTileRowSize64(GetTiff()) : TIFFScanlineSize64(GetTiff());
     if (nClaimed != nExpected)
-        Fail("rows of " + std::to_string(nClaimed) + " bytes instead of " + std::to_string(nExpected) +
-             " cannot be read correctly");
+        Refuse("rows of " + std::to_string(nClaimed) + " bytes instead of " + std::to_string(nExpected));
 }
 
 } // namespace krv::plugins::tif

@@ -81,8 +81,13 @@ public:
     std::span<const unsigned char> GetJpegTables() const;
     StrileTable& GetStriles() { return *mpoStriles; }
 
-    // Throws FileFormatException "<file>: <what>".
+    // Throws FileFormatException "<file>: <what>; the file is damaged", and the other "<file>: <what>; the file is of a
+    // kind that is not read".
     [[noreturn]] void Fail(const std::string& what, const Place& oPlace = Place::Current()) const;
+    [[noreturn]] void Refuse(const std::string& what, const Place& oPlace = Place::Current()) const;
+    // What went wrong inside libtiff, after the words that say where.
+    [[noreturn]] void Fail(const std::string& where, const TiffTrouble& oTrouble,
+                           const Place& oPlace = Place::Current()) const;
 
 private:
     PeekReader& CheckDirectory();

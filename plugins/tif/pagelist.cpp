@@ -26,21 +26,39 @@ public:
     void WalkChain(std::uint64_t nOffset)
     {
         while (nOffset != 0)
-            nOffset = Note(nOffset);
+            nOffset = Try(nOffset, false);
     }
 
     void WalkBelowFirst()
     {
         for (std::uint64_t nOffset : std::vector(moSubDirectories))
             if (nOffset != 0)
-                Note(nOffset);
+                Try(nOffset, true);
     }
 
     std::vector<PageSummary> Take() { return std::move(moPages); }
+    const std::string& GetTrouble() const { return moTrouble; }
 
 private:
+    // The first trouble is kept: what follows may stem from it.
+    std::uint64_t Try(std::uint64_t nOffset, bool bBelowFirst)
+    {
+        try
+        {
+            return Note(nOffset, bBelowFirst);
+        }
+        catch (const FileFormatException& oException)
+        {
+            if (moPages.empty())
+                throw;
+            if (moTrouble.empty())
+                moTrouble = oException.GetMessage().substr(oException.GetFileName().size() + 2);
+            return 0;
+        }
+    }
+
     // Returns where the next directory lies; 0 after the last one.
-    std::uint64_t Note(std::uint64_t nOffset)
+    std::uint64_t Note(std::uint64_t nOffset, bool bBelowFirst)
     {
         if (!moSeen.insert(nOffset).second)
             Fail("its directories form a circle");
@@ -50,13 +68,13 @@ private:
         if (moPages.empty())
             moSubDirectories = oDirectory.GetNumbers(moReader, TIFFTAG_SUBIFD, MAXIMUM_SUBDIRECTORIES);
         moPages.push_back(Summarise(oDirectory));
+        moPages.back().mbBelowFirst = bBelowFirst;
         return oDirectory.GetNext();
     }
 
     [[noreturn]] void Fail(const std::string& what) const
     {
-        const std::string& fileName = moReader.GetFile().GetName();
-        throw FileFormatException(fileName, fileName + ": " + what);
+        ThrowDamaged(moReader.GetFile().GetName(), what, Place::Current());
     }
 
     PageSummary Summarise(const RawDirectory& oDirectory)
@@ -102,6 +120,7 @@ private:
     std::unordered_set<std::uint64_t> moSeen;
     std::vector<std::uint64_t> moSubDirectories;
     std::vector<PageSummary> moPages;
+    std::string moTrouble;
 };
 
 bool IsSmaller(const PageSummary& oPage, const PageSummary& oFull)
@@ -179,11 +198,12 @@ unsigned int ParsePageName(const std::string& name, bool bLevel)
     return name == MakePageName(nNumber, bLevel) && nNumber >= (bLevel ? 2u : 1u) ? nNumber : 0;
 }
 
-std::vector<PageSummary> ListPages(PeekReader& oReader, const FileHeader& oHeader)
+std::vector<PageSummary> ListPages(PeekReader& oReader, const FileHeader& oHeader, std::string& trouble)
 {
     Scanner oScanner(oReader, oHeader);
     oScanner.WalkChain(oHeader.mnFirstDirectory);
     oScanner.WalkBelowFirst();
+    trouble = oScanner.GetTrouble();
     return oScanner.Take();
 }
 
@@ -228,6 +248,19 @@ std::vector<PageLevel> FindMaskLevels(const std::vector<PageSummary>& oPages)
     if (oMasks.empty() || !oMasks.front().mbMask)
         return {};
     return CollectLevels(oPages, IsMaskForm);
+}
+
+unsigned int CountFurtherImages(const std::vector<PageSummary>& oPages)
+{
+    std::set<std::uint64_t> oBitmaps;
+    for (const PageSummary& oMask : FindMasks(oPages))
+        oBitmaps.insert(oMask.mnOffset);
+    const auto nImages = std::count_if(oPages.begin(), oPages.end(),
+                                       [&oBitmaps](const PageSummary& oPage) {
+                                           return !oPage.mbReduced && !oPage.mbMask && !oPage.mbBelowFirst &&
+                                                  !oBitmaps.contains(oPage.mnOffset);
+                                       });
+    return static_cast<unsigned int>(nImages) - (oPages.front().mbReduced || oPages.front().mbMask ? 0 : 1);
 }
 
 } // namespace krv::plugins::tif

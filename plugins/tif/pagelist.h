@@ -20,8 +20,9 @@ struct PageSummary
     std::uint64_t mnFormat = 1;
     bool mbReduced = false;
     bool mbMask = false;
-    bool mbPage = false;      // one of a multi-page file
-    bool mbDescribed = false; // has an image description that is not empty
+    bool mbPage = false;       // one of a multi-page file
+    bool mbDescribed = false;  // has an image description that is not empty
+    bool mbBelowFirst = false; // not of the main chain
     // Of a level its reduction factor, of a bitmap its number, where its name says so; else 0.
     unsigned int mnNumber = 0;
 };
@@ -32,9 +33,10 @@ std::string MakePageName(unsigned int nNumber, bool bLevel);
 unsigned int ParsePageName(const std::string& name, bool bLevel);
 
 // All pages of a file, the first one first: the main chain, then the directories that the first page lists below itself
-// (what further hangs on those is left alone). Throws FileFormatException for a damaged directory, a chain that runs in
-// a circle, and more than MAXIMUM_PAGES.
-std::vector<PageSummary> ListPages(PeekReader& oReader, const FileHeader& oHeader);
+// (what further hangs on those is left alone). A chain that breaks, by a damaged directory, in a circle, or with more
+// than MAXIMUM_PAGES, ends there, and what broke it goes to trouble. Throws FileFormatException for a damaged first
+// one.
+std::vector<PageSummary> ListPages(PeekReader& oReader, const FileHeader& oHeader, std::string& trouble);
 
 constexpr std::size_t MAXIMUM_PAGES = 65535;
 constexpr std::size_t MAXIMUM_SUBDIRECTORIES = 4096;
@@ -60,5 +62,8 @@ std::vector<PageLevel> FindLevels(const std::vector<PageSummary>& oPages);
 std::vector<PageSummary> FindMasks(const std::vector<PageSummary>& oPages);
 // The reduced masks; none when there is no mask that they could belong to.
 std::vector<PageLevel> FindMaskLevels(const std::vector<PageSummary>& oPages);
+
+// Pages of the main chain that are none of these and not reduced: further images.
+unsigned int CountFurtherImages(const std::vector<PageSummary>& oPages);
 
 } // namespace krv::plugins::tif

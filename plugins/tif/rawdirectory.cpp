@@ -19,12 +19,12 @@ void WriteNumber(unsigned char* pBytes, std::size_t nBytes, bool bBigEndian, std
         pBytes[bBigEndian ? nBytes - 1 - nAt : nAt] = static_cast<unsigned char>(nValue >> (8 * nAt));
 }
 
-[[noreturn]] void ThrowDamaged(const std::string& fileName, const std::string& what, const Place& oPlace)
-{
-    throw FileFormatException(fileName, fileName + ": " + what, oPlace);
-}
-
 } // namespace
+
+void ThrowDamaged(const std::string& fileName, const std::string& what, const Place& oPlace)
+{
+    throw FileFormatException(fileName, fileName + ": " + what + "; the file is damaged", oPlace);
+}
 
 std::uint64_t ReadNumber(const unsigned char* pBytes, std::size_t nBytes, bool bBigEndian)
 {

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "plugins/tif/peekreader.h"
+#include "toolkit/exceptions/place.h"
 
 #include <cstdint>
 #include <optional>
@@ -30,6 +31,9 @@ struct FileHeader
 
 // Whole numbers of 1, 2, 4 or 8 bytes in the byte order of a file.
 std::uint64_t ReadNumber(const unsigned char* pBytes, std::size_t nBytes, bool bBigEndian);
+
+// Throws FileFormatException "<file>: <what>; the file is damaged".
+[[noreturn]] void ThrowDamaged(const std::string& fileName, const std::string& what, const Place& oPlace);
 
 // Bytes of one value of a tag's type; 0 for a type that is not known.
 std::size_t GetTypeBytes(std::uint16_t nType);

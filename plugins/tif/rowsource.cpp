@@ -37,10 +37,10 @@ void RowSource::DecodeUpTo(unsigned int nPlane, std::uint32_t nRow)
             TIFFReadScanline(oHandle.Get(), moStored.data(), mnNextRow, static_cast<std::uint16_t>(nPlane));
         if (nDone == 1)
             continue;
-        const std::string message = oHandle.TakeMessage("its data are damaged");
+        const TiffTrouble oTrouble = oHandle.TakeTrouble();
         const std::uint32_t nFailed = mnNextRow;
         mnNextRow = 0;
-        mpoPage->Fail("row " + std::to_string(nFailed) + ": " + message);
+        mpoPage->Fail("row " + std::to_string(nFailed) + ": ", oTrouble);
     }
     mnPlane = nPlane;
 }

@@ -103,9 +103,9 @@ void StrileDecoder::DecodeByLibrary(std::uint32_t nStrile, unsigned char* pRaw, 
     oHandle.Forget();
     const int nDone = TIFFReadFromUserBuffer(oHandle.Get(), nStrile, oRaw.data(), static_cast<tmsize_t>(oRaw.size()),
                                              pTarget, static_cast<tmsize_t>(nBytes));
-    const std::string message = oHandle.TakeMessage("its data are damaged");
-    if (nDone != 1 || oHandle.HasLostData())
-        moPage.Fail(Describe(nStrile) + ": " + message);
+    const TiffTrouble oTrouble = oHandle.TakeTrouble();
+    if (nDone != 1 || oTrouble.mbLostData)
+        moPage.Fail(Describe(nStrile) + ": ", oTrouble);
 }
 
 void StrileDecoder::Decode(std::uint32_t nStrile, std::uint32_t nStoredRows, unsigned char* pRaw, std::size_t nRaw,

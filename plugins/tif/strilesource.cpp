@@ -68,8 +68,7 @@ StrileSource::StrileSource(std::shared_ptr<Page> poPage, PixelUse eUse)
       moDecoder(*mpoPage)
 {
     if (!mbPlain && GetStrileBytes(moForm) > MAXIMUM_STRILE_BYTES)
-        mpoPage->Fail("compressed strips or tiles of " + std::to_string(GetStrileBytes(moForm)) +
-                      " bytes are too large");
+        mpoPage->Refuse("compressed strips or tiles of " + std::to_string(GetStrileBytes(moForm)) + " bytes");
 }
 
 StrileSource::~StrileSource() = default;

@@ -14,6 +14,7 @@
 #include "plugins/tif/writing/metadatawriter.h"
 #include "plugins/tif/writing/pagewriter.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/warning.h"
 
 #include <algorithm>
 #include <cctype>
@@ -73,6 +74,7 @@ struct TifDataset::PageTable
     std::vector<PageLevel> moLevels;
     std::vector<PageSummary> moMasks;
     std::vector<PageLevel> moMaskLevels;
+    unsigned int mnFurtherImages = 0;
 };
 
 TifDataset::TifDataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat)
@@ -277,15 +279,23 @@ const TifDataset::PageTable& TifDataset::GetPages() const
     Page& oPage = GetPage();
     if (!mpoPages)
     {
+        std::string trouble;
         const std::vector<PageSummary> oPages =
-            mpoEditor ? mpoEditor->Summarise() : ListPages(oPage.GetReader(), oPage.GetHeader());
-        mpoPages =
-            std::make_unique<PageTable>(PageTable{FindLevels(oPages), FindMasks(oPages), FindMaskLevels(oPages)});
+            mpoEditor ? mpoEditor->Summarise() : ListPages(oPage.GetReader(), oPage.GetHeader(), trouble);
+        mpoPages = std::make_unique<PageTable>(
+            PageTable{FindLevels(oPages), FindMasks(oPages), FindMaskLevels(oPages), tif::CountFurtherImages(oPages)});
+        if (!trouble.empty())
+            Complain("levels and masks are listed only as far as the chain of directories is sound: " + trouble);
         // Reduced masks of no mask are no levels of anything.
         if (mpoPages->moMasks.empty() || !mpoPages->moMasks.front().mbMask)
             mpoPages->moMaskLevels.clear();
     }
     return *mpoPages;
+}
+
+unsigned int TifDataset::CountFurtherImages() const
+{
+    return GetPages().mnFurtherImages;
 }
 
 const std::vector<PageLevel>& TifDataset::GetLevels(PixelUse eUse) const
@@ -321,7 +331,22 @@ krv::datasources::AuxiliaryData TifDataset::ReadPageMetadata(std::uint64_t nDire
 
 krv::datasources::AuxiliaryData TifDataset::ReadAuxiliaryData()
 {
-    return ReadMetadata(GetPage());
+    return ReadRecord();
+}
+
+krv::datasources::AuxiliaryData TifDataset::ReadRecord() const
+{
+    std::string trouble;
+    krv::datasources::AuxiliaryData oRecord = ReadMetadata(GetPage(), &trouble);
+    Complain(trouble);
+    return oRecord;
+}
+
+void TifDataset::Complain(const std::string& trouble) const
+{
+    if (trouble.empty() || !moComplaints.insert(trouble).second)
+        return;
+    krv::nspio::Warning::Warn(mpoFile->GetName() + ": " + trouble, "plugins/tif/tifdataset", __LINE__);
 }
 
 void TifDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData)
@@ -423,7 +448,10 @@ void TifDataset::ChangeChannels(const std::vector<unsigned int>& oSources, const
 
 krv::ogc::cs::ICRS* TifDataset::ReadCRS() const
 {
-    return tif::ReadCRS(GetPage().GetTiff()).release();
+    std::string trouble;
+    std::unique_ptr<krv::ogc::cs::ICRS> poCRS = tif::ReadCRS(GetPage().GetTiff(), &trouble);
+    Complain(trouble);
+    return poCRS.release();
 }
 
 krv::datasources::IOverviewManager* TifDataset::GetOverviewManager()
@@ -702,7 +730,7 @@ const krv::datasources::AuxiliaryData& TifDataset::GetBook(PixelUse eUse) const
     if (oFound != moBooks.end())
         return oFound->second;
     krv::datasources::AuxiliaryData oBook =
-        eUse == PixelUse::eImage ? ReadMetadata(GetPage())
+        eUse == PixelUse::eImage ? ReadRecord()
                                  : ReadPageMetadata(GetMask(GetLevelBitmap(), Place::Current()).mnOffset);
     return moBooks[eUse] = std::move(oBook);
 }

@@ -2,6 +2,7 @@
 
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/metadata/auxiliarydata.h"
@@ -16,6 +17,7 @@
 #include <map>
 #include <memory>
 #include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -31,7 +33,8 @@ class TifDataset : public support::Dataset,
                    public krv::datasources::IGeocodedDataset,
                    public krv::datasources::IBitmapDataset,
                    public krv::datasources::IPCTDataset,
-                   public krv::datasources::IStorageDataset
+                   public krv::datasources::IStorageDataset,
+                   public krv::datasources::IPagedDataset
 {
 public:
     // Throws krv::FileException kinds that name file and cause; nothing stays open then.
@@ -86,6 +89,8 @@ public:
     void SetPCTDescription(unsigned int nPCT, const std::string& oDescription) override;
     void DeletePCT(unsigned int nPCT) override;
 
+    unsigned int CountFurtherImages() const override;
+
     std::optional<std::uint64_t> GetUnusedBytes() override;
 
     // For the overview managers: the levels of the image or of its mask, and the pixels of a page.
@@ -126,6 +131,9 @@ private:
     const PageTable& GetPages() const;
     const PageSummary& GetMask(unsigned int nBitmap, const Place& oPlace) const;
     void CheckPCT(unsigned int nPCT, const Place& oPlace) const;
+    krv::datasources::AuxiliaryData ReadRecord() const;
+    // Says once what is wrong with the file and does not keep it from being read.
+    void Complain(const std::string& trouble) const;
 
     std::shared_ptr<FileEditor> mpoEditor; // null when the file is only read
     std::shared_ptr<support::File> mpoFile;
@@ -135,6 +143,7 @@ private:
     mutable std::map<PixelUse, krv::datasources::AuxiliaryData> moBooks;
     mutable std::unique_ptr<PageTable> mpoPages;
     mutable std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding;
+    mutable std::set<std::string> moComplaints; // what was said already
     std::map<std::pair<std::uint64_t, PixelUse>, std::shared_ptr<support::BlockImage>> moImages;
 };
 

@@ -1,6 +1,7 @@
 #include "plugins/tif/tiffhandle.h"
 
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/debugger.h"
 
 #include <algorithm>
 #include <cstdarg>
@@ -18,7 +19,8 @@ struct TiffHandle::Client
     std::size_t mnHeaderBytes;
     unsigned char maHeader[FileHeader::BYTES] = {};
     std::uint64_t mnPosition = 0;
-    char maMessage[512] = {};
+    char maCause[512] = {}; // of the reader below libtiff
+    bool mbUnknownKind = false;
     bool mbLostData = false;
 
     Client(PeekReader& oReader, const FileHeader& oHeader, std::uint64_t nDirectory)
@@ -29,12 +31,6 @@ struct TiffHandle::Client
 
     static Client& From(thandle_t pClient) { return *static_cast<Client*>(pClient); }
 
-    void Note(const char* pText)
-    {
-        if (maMessage[0] == '\0')
-            std::snprintf(maMessage, sizeof(maMessage), "%s", pText);
-    }
-
     static tmsize_t Read(thandle_t pClient, void* pTarget, tmsize_t nBytes) noexcept;
     static tmsize_t Write(thandle_t, void*, tmsize_t) noexcept { return -1; }
     static toff_t Seek(thandle_t pClient, toff_t nOffset, int nWhence) noexcept;
@@ -42,6 +38,7 @@ struct TiffHandle::Client
     static toff_t Size(thandle_t pClient) noexcept { return From(pClient).moReader.GetFile().GetSize(); }
     static int Map(thandle_t, void**, toff_t*) noexcept { return 0; }
     static void Unmap(thandle_t, void*, toff_t) noexcept {}
+    void Note(const char* pText, bool bWarning) noexcept;
     static int OnError(TIFF*, void* pClient, const char* pModule, const char* pFormat, va_list oArguments) noexcept;
     static int OnWarning(TIFF*, void* pClient, const char* pModule, const char* pFormat, va_list oArguments) noexcept;
 };
@@ -68,7 +65,8 @@ tmsize_t TiffHandle::Client::Read(thandle_t pClient, void* pTarget, tmsize_t nBy
     }
     catch (const std::exception& oException)
     {
-        oClient.Note(oException.what());
+        if (oClient.maCause[0] == '\0')
+            std::snprintf(oClient.maCause, sizeof(oClient.maCause), "%s", oException.what());
     }
     return -1;
 }
@@ -85,12 +83,32 @@ toff_t TiffHandle::Client::Seek(thandle_t pClient, toff_t nOffset, int nWhence) 
     return oClient.mnPosition;
 }
 
+void TiffHandle::Client::Note(const char* pText, bool bWarning) noexcept
+{
+    const std::string_view text = pText;
+    // Bytes that some writers pad a stream with; the decoder passes over them.
+    if (bWarning && text.find("extraneous bytes before marker") != std::string_view::npos)
+        return;
+    mbLostData = true;
+    for (const char* pWords : {"not supported", "nsupported", "not configured", "not implemented"})
+        mbUnknownKind |= text.find(pWords) != std::string_view::npos;
+    try
+    {
+        if (krv::nspio::Debugger::GetLevel() != 0)
+            krv::nspio::Debugger::Debug(1, "libtiff", moReader.GetFile().GetName() + ": " + pText,
+                                        "plugins/tif/tiffhandle", __LINE__);
+    }
+    catch (...)
+    {
+        // No exception may pass through libtiff.
+    }
+}
+
 int TiffHandle::Client::OnError(TIFF*, void* pClient, const char*, const char* pFormat, va_list oArguments) noexcept
 {
     char aText[512];
     std::vsnprintf(aText, sizeof(aText), pFormat, oArguments);
-    static_cast<Client*>(pClient)->Note(aText);
-    static_cast<Client*>(pClient)->mbLostData = true;
+    static_cast<Client*>(pClient)->Note(aText, false);
     return 1;
 }
 
@@ -99,19 +117,18 @@ int TiffHandle::Client::OnWarning(TIFF*, void* pClient, const char* pModule, con
                                   va_list oArguments) noexcept
 {
     const std::string_view module = pModule != nullptr ? pModule : "";
-    if (module.starts_with("Fax") || module.starts_with("JPEG"))
-        OnError(nullptr, pClient, pModule, pFormat, oArguments);
+    if (!module.starts_with("Fax") && !module.starts_with("JPEG"))
+        return 1;
+    char aText[512];
+    std::vsnprintf(aText, sizeof(aText), pFormat, oArguments);
+    static_cast<Client*>(pClient)->Note(aText, true);
     return 1;
-}
-
-bool TiffHandle::HasLostData() const
-{
-    return mpoClient->mbLostData;
 }
 
 void TiffHandle::Forget()
 {
-    mpoClient->maMessage[0] = '\0';
+    mpoClient->maCause[0] = '\0';
+    mpoClient->mbUnknownKind = false;
     mpoClient->mbLostData = false;
 }
 
@@ -130,7 +147,11 @@ TiffHandle::TiffHandle(PeekReader& oReader, const FileHeader& oHeader, std::uint
         TIFFClientOpenExt(fileName.c_str(), "rmcDO", mpoClient.get(), &Client::Read, &Client::Write, &Client::Seek,
                           &Client::Close, &Client::Size, &Client::Map, &Client::Unmap, poOptions.get());
     if (mpoTiff == nullptr)
-        throw FileFormatException(fileName, fileName + ": " + TakeMessage("the TIFF directory cannot be read"));
+    {
+        const TiffTrouble oTrouble = TakeTrouble();
+        ThrowDamaged(fileName, oTrouble.moCause.empty() ? "its directory makes no sense" : oTrouble.moCause,
+                     Place::Current());
+    }
     Forget();
 }
 
@@ -140,11 +161,11 @@ TiffHandle::~TiffHandle()
         TIFFClose(mpoTiff);
 }
 
-std::string TiffHandle::TakeMessage(const char* pAlternative)
+TiffTrouble TiffHandle::TakeTrouble()
 {
-    std::string text = mpoClient->maMessage[0] != '\0' ? mpoClient->maMessage : pAlternative;
-    mpoClient->maMessage[0] = '\0';
-    return text;
+    const TiffTrouble oTrouble{mpoClient->maCause, mpoClient->mbUnknownKind, mpoClient->mbLostData};
+    Forget();
+    return oTrouble;
 }
 
 } // namespace krv::plugins::tif

@@ -12,6 +12,14 @@
 namespace krv::plugins::tif
 {
 
+// What went wrong inside libtiff. Its own words go to the debug output: they tell a user nothing.
+struct TiffTrouble
+{
+    std::string moCause;        // why the file could not be read, in the words of this library; empty when it could
+    bool mbUnknownKind = false; // libtiff cannot decode data of this kind
+    bool mbLostData = false;    // something failed, or a codec made up pixels for data that it could not decode
+};
+
 // libtiff's view of one directory of a file. Every directory gets a handle of its own, whose header names that
 // directory as the first one, so that a handle never moves. Nothing is printed: what libtiff has to say ends in
 // exceptions. Nothing is mapped, strip and tile arrays are left in the file. One thread at a time.
@@ -21,7 +29,7 @@ public:
     // No single allocation of libtiff is larger.
     static constexpr tmsize_t MAXIMUM_ALLOCATION = tmsize_t{224} << 20;
 
-    // Throws FileFormatException with libtiff's reason. The reader outlives the handle.
+    // Throws FileFormatException. The reader outlives the handle.
     TiffHandle(PeekReader& oReader, const FileHeader& oHeader, std::uint64_t nDirectory);
     ~TiffHandle();
     TiffHandle(const TiffHandle&) = delete;
@@ -29,12 +37,8 @@ public:
 
     TIFF* Get() const { return mpoTiff; }
 
-    // The first error since the last call, or nAlternative when there was none.
-    std::string TakeMessage(const char* pAlternative);
-
-    // Whether anything failed, or a codec made up pixels for data that it could not decode, since Forget(). libtiff
-    // calls some of that a success.
-    bool HasLostData() const;
+    // What went wrong since the last call or Forget(). libtiff calls some of that a success.
+    TiffTrouble TakeTrouble();
 
     void Forget();
 

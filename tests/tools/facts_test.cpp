@@ -148,6 +148,7 @@ void ComparePalette(const Facts& oFacts, krv::datasources::IPCTDataset& oDataset
 
 void CompareGeography(const Facts& oFacts, const json& oInfo)
 {
+    EXPECT_EQ(oInfo["furtherImages"], oFacts.List("other_pages", ' ').size());
     const std::string& crs = oFacts["crs"];
     if (crs.starts_with("EPSG:"))
     {

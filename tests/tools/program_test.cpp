@@ -242,6 +242,38 @@ TEST(Command, ForeignBytesInMetadataKeepTheJsonValid)
     EXPECT_EQ(RunKrv({"info", file}).output.find('\x01'), std::string::npos);
 }
 
+// What spoils a part leaves the rest to be shown, and `doctor` names it.
+TEST(Command, SpoiltPartsAreNamedAndTheRestIsShown)
+{
+    const TempFolder oFolder;
+    const std::string file = oFolder.File("spoilt.tif"), other = oFolder.File("chain.tif");
+    WriteSparse(file, 16, "<no xml & no end");
+    std::string bytes = krv::conformance::ReadFile(file);
+    const std::size_t nTag = bytes.find(std::string("\x0E\x01\x02\0", 4));
+    ASSERT_NE(nTag, std::string::npos);
+    bytes.replace(nTag, 2, "\x80\xA4"); // the description becomes tag 42112
+    oFolder.Write("spoilt.tif", bytes);
+    WriteSparse(other, 16, "fine");
+    bytes = krv::conformance::ReadFile(other);
+    std::uint64_t nDirectory = 0;
+    std::memcpy(&nDirectory, &bytes[8], 8);
+    bytes.replace(nDirectory + 8 + 20 * static_cast<unsigned char>(bytes[nDirectory]), 8, "\x7F\x7F\x7F\0\0\0\0\0", 8);
+    oFolder.Write("chain.tif", bytes);
+    for (const auto& [name, words] :
+         {std::pair(file, "spoilt.tif: tag 42112"), std::pair(other, "chain of directories")})
+    {
+        const auto oInfo = RunKrv({"info", name});
+        EXPECT_EQ(oInfo.code, 0) << oInfo.errors;
+        EXPECT_NE(oInfo.errors.find(words), std::string::npos) << oInfo.errors;
+        EXPECT_EQ(oInfo.errors.find(words), oInfo.errors.rfind(words)) << "said once";
+        EXPECT_EQ(RunKrv({"view", name, oFolder.File("a.png")}).code, 0);
+        EXPECT_EQ(RunKrv({"convert", name, oFolder.File("copy.tif")}).code, 0);
+        const auto oDoctor = RunKrv({"doctor", name});
+        EXPECT_EQ(oDoctor.code, 1);
+        EXPECT_NE(oDoctor.output.find(words), std::string::npos) << oDoctor.output;
+    }
+}
+
 TEST(Command, StopsCleanlyWhenInterrupted)
 {
     const TempFolder oFolder;

@@ -2,14 +2,21 @@
 
 #include "datasources/formatregistrar/winformatregistrar.h"
 #include "datasources/interfaces/formatplugin.h"
+#include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/ifileformat.h"
+#include "datasources/interfaces/ioverviewmanager.h"
+#include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/irasterio.h"
 #include "datasources/iomanager/datasetmanager.h"
+#include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/basicreader.h"
+#include "gobs/pct/pct.h"
 #include "gobs/raster/raster.h"
 #include "toolkit/core/core.h"
 #include "toolkit/nspio/warning.h"
+#include "toolkit/ogc/cs/icrs.h"
 #include "toolkit/xml/xmltree.h"
 #include "tools/krv/errors.h"
 
@@ -18,6 +25,7 @@
 #include <array>
 #include <filesystem>
 #include <fstream>
+#include <functional>
 #include <iterator>
 #include <string_view>
 
@@ -263,6 +271,15 @@ void ReadEnds(IDataset& oDataset, unsigned int nChannel)
         const std::unique_ptr<krv::gobs::Raster> poTile(oReader.GetRaster(nTile));
 }
 
+// The blocks of the first and the last pixel.
+void ReadEnds(IRasterIO& oIO)
+{
+    constexpr std::size_t LARGEST_PIXEL = 16;
+    std::array<unsigned char, LARGEST_PIXEL> oPixel{};
+    oIO.ReadWindow(0U, 0U, 1U, 1U, oPixel.data());
+    oIO.ReadWindow(oIO.GetFileWidth() - 1, oIO.GetFileHeight() - 1, 1U, 1U, oPixel.data());
+}
+
 std::string DescribeOpened(IDataset& oDataset)
 {
     const auto* const poRaster = dynamic_cast<IRasterDataset*>(&oDataset);
@@ -274,37 +291,94 @@ std::string DescribeOpened(IDataset& oDataset)
                        poRaster->GetChanCount(), poRaster->GetChanCount() == 1 ? "" : "s");
 }
 
-Finding CheckOpening(const std::string& file, const LoadedPlugin& oPlugin)
+constexpr const char* DAMAGE_REMEDY = "get an undamaged copy, or convert it to a plainer kind";
+
+// Reads what the other verbs read beside pixels, one thing after the other, so that each that fails is named.
+void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Finding>& oFindings)
+{
+    const auto Try = [&](const char* pWhat, const std::function<void()>& oRead)
+    {
+        try
+        {
+            oRead();
+        }
+        catch (...)
+        {
+            oFindings.push_back(
+                {false, subject, fmt::format("{} cannot be read: {}", pWhat, CurrentMessage()), DAMAGE_REMEDY});
+        }
+    };
+    Try("the metadata", [&] { oDataset.ReadAuxiliaryData(); });
+    Try("the reference system", [&] { std::unique_ptr<krv::ogc::cs::ICRS>(oDataset.ReadCRS()); });
+    if (auto* const poRaster = dynamic_cast<IRasterDataset*>(&oDataset); poRaster != nullptr)
+        Try("the levels",
+            [&]
+            {
+                const std::unique_ptr<IOverviewManager> poLevels(poRaster->GetOverviewManager());
+                for (const unsigned int nLevel : poLevels ? poLevels->GetLevels() : std::vector<unsigned int>())
+                    ReadEnds(*std::unique_ptr<IRasterIO>(poLevels->GetOverviewIO(nLevel, {1})));
+            });
+    if (auto* const poBitmaps = dynamic_cast<IBitmapDataset*>(&oDataset); poBitmaps != nullptr)
+        Try("the bitmaps",
+            [&]
+            {
+                for (const unsigned int nBitmap : poBitmaps->GetBitmapList())
+                    ReadEnds(*std::unique_ptr<IRasterIO>(poBitmaps->GetBitmapIO({nBitmap})));
+            });
+    if (const auto* const poTables = dynamic_cast<IPCTDataset*>(&oDataset); poTables != nullptr)
+        Try("the colour tables",
+            [&]
+            {
+                for (const unsigned int nTable : poTables->GetPCTList())
+                    std::unique_ptr<krv::gobs::PCT>(poTables->GetPCT(nTable));
+            });
+}
+
+// What is warned of while the file is read is a finding too.
+void CheckOpening(const std::string& file, const LoadedPlugin& oPlugin, std::vector<Finding>& oFindings)
 {
     const std::string subject = "format " + oPlugin.name;
+    std::vector<std::string> oWarnings;
+    const auto oFormerSink = krv::nspio::Warning::SetSink(
+        [&oWarnings](const std::string& message, const std::string&, unsigned int) { oWarnings.push_back(message); });
     try
     {
         const std::unique_ptr<IDataset> poDataset(oPlugin.builder->Open(file, eReadOnly));
         if (poDataset == nullptr)
-            return {false, subject, "recognises the file and opens nothing", "report the plug-in"};
-        return {true, subject, "recognises the file; " + DescribeOpened(*poDataset), {}};
+            oFindings.push_back({false, subject, "recognises the file and opens nothing", "report the plug-in"});
+        else
+        {
+            oFindings.push_back({true, subject, "recognises the file; " + DescribeOpened(*poDataset), {}});
+            TryParts(*poDataset, subject, oFindings);
+        }
     }
     catch (...)
     {
-        return {false, subject, "recognises the file and cannot read it: " + CurrentMessage(),
-                "get an undamaged copy, or convert it to a plainer kind"};
+        oFindings.push_back(
+            {false, subject, "recognises the file and cannot read it: " + CurrentMessage(), DAMAGE_REMEDY});
     }
+    krv::nspio::Warning::SetSink(oFormerSink);
+    for (const std::string& warning : oWarnings)
+        oFindings.push_back({false, subject, warning, "what is named is not used; get an undamaged copy, or mend it"});
 }
 
-Finding AskPlugin(const std::string& file, const LoadedPlugin& oPlugin, const Header& oHeader, bool& bRecognised)
+void AskPlugin(const std::string& file, const LoadedPlugin& oPlugin, const Header& oHeader, bool& bRecognised,
+               std::vector<Finding>& oFindings)
 {
     try
     {
         const int nAnswer = oPlugin.builder->Identify(file, oHeader.data(), HEADER_BYTES, 0);
         if (nAnswer != 0)
-            return {true, "format " + oPlugin.name, fmt::format("not its own (answer {})", nAnswer), {}};
+            return oFindings.push_back(
+                {true, "format " + oPlugin.name, fmt::format("not its own (answer {})", nAnswer), {}});
     }
     catch (...)
     {
-        return {false, "format " + oPlugin.name, "fails while it looks: " + CurrentMessage(), "report the plug-in"};
+        return oFindings.push_back(
+            {false, "format " + oPlugin.name, "fails while it looks: " + CurrentMessage(), "report the plug-in"});
     }
     bRecognised = true;
-    return CheckOpening(file, oPlugin);
+    CheckOpening(file, oPlugin, oFindings);
 }
 
 } // namespace
@@ -326,7 +400,7 @@ std::vector<Finding> CheckFile(const std::string& file, const std::vector<Loaded
         return {{false, "file " + file, "it is empty", "get the file again"}};
     bool bRecognised = false;
     for (const LoadedPlugin& oPlugin : oPlugins)
-        oFindings.push_back(AskPlugin(file, oPlugin, oHeader, bRecognised));
+        AskPlugin(file, oPlugin, oHeader, bRecognised, oFindings);
     if (!bRecognised)
         oFindings.push_back({false, "file " + file, "no format recognises it",
                              "install the plug-in of its format, or convert it to one that `krv formats` lists"});

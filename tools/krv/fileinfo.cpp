@@ -6,6 +6,7 @@
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
+#include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/istoragedataset.h"
@@ -14,8 +15,11 @@
 #include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/reader/irasterreader.h"
 #include "gobs/pct/pct.h"
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 #include "toolkit/ogc/cs/icrs.h"
+#include "tools/krv/errors.h"
 #include "tools/krv/sourcefile.h"
 
 #include <memory>
@@ -96,6 +100,29 @@ Json CrsToJson(const SourceFile& oFile)
         return nullptr;
     const int nEpsg = poCrs->GetEPSG();
     return {{"name", poCrs->GetName()}, {"epsg", nEpsg != 0 ? Json(nEpsg) : Json(nullptr)}, {"wkt", poCrs->GetWKT()}};
+}
+
+// A part that cannot be read leaves the others to be shown.
+template <typename Part>
+Json Attempt(const SourceFile& oFile, const char* pWhat, Json oOtherwise, Part oPart)
+{
+    try
+    {
+        return oPart();
+    }
+    catch (const krv::Exception&)
+    {
+        krv::nspio::Warning::Warn(oFile.GetName() + ": " + pWhat + " cannot be read: " + CurrentMessage(),
+                                  "tools/krv/fileinfo", 0);
+        return oOtherwise;
+    }
+}
+
+// Null where the format has no such files.
+Json FurtherImagesToJson(const SourceFile& oFile)
+{
+    const auto* const poPages = dynamic_cast<IPagedDataset*>(&oFile.GetDataset());
+    return poPages != nullptr ? Json(poPages->CountFurtherImages()) : Json(nullptr);
 }
 
 Json OverviewsToJson(IRasterReader& oReader)
@@ -189,15 +216,16 @@ Json GatherInfo(const SourceFile& oFile)
     for (unsigned int i = 1; i <= oRaster.GetChanCount(); ++i)
         oJson["channels"].push_back(ChannelToJson(oFile, i));
     oJson["metadata"] = MapToJson(oFile.GetMetadata().GetFileMetadata());
-    const Json oCrs = CrsToJson(oFile);
+    const Json oCrs = Attempt(oFile, "the reference system", nullptr, [&] { return CrsToJson(oFile); });
     oJson["geocoding"] = GeocodingToJson(oFile, !oCrs.is_null());
     oJson["crs"] = oCrs;
-    oJson["overviews"] = OverviewsToJson(oReader.Get());
-    oJson["bitmaps"] = BitmapsToJson(oFile);
+    oJson["overviews"] = Attempt(oFile, "the levels", Json::array(), [&] { return OverviewsToJson(oReader.Get()); });
+    oJson["bitmaps"] = Attempt(oFile, "the bitmaps", Json::array(), [&] { return BitmapsToJson(oFile); });
     oJson["mathModels"] = MathModelsToJson(oFile);
-    oJson["colourTables"] = TablesToJson(oFile);
+    oJson["colourTables"] = Attempt(oFile, "the colour tables", Json::array(), [&] { return TablesToJson(oFile); });
     oJson["displayDefaults"] = DisplayToJson(oFile);
     oJson["unusedBytes"] = UnusedToJson(oFile);
+    oJson["furtherImages"] = FurtherImagesToJson(oFile);
     return oJson;
 }
 

@@ -130,6 +130,8 @@ std::string InfoText(const Json& oInfo)
     text += DisplayText(oInfo["displayDefaults"]);
     if (!oInfo["unusedBytes"].is_null() && oInfo["unusedBytes"] != 0)
         text += Line("unused", fmt::format("{} bytes of the file", Text(oInfo["unusedBytes"])));
+    if (oInfo["furtherImages"].is_number() && oInfo["furtherImages"] != 0)
+        text += Line("further", oInfo["furtherImages"].dump() + " images behind this one, which are not shown");
     text += "  channels\n";
     for (const Json& oChannel : oInfo["channels"])
         text += ChannelText(oChannel);

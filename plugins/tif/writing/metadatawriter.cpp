@@ -99,6 +99,7 @@ void MetadataWriter::Write(const AuxiliaryData& oNew, const Place& oPlace)
     StoreItems(oNew, oPlace);
 }
 
+// Only a key in the very letters of its tag.
 void MetadataWriter::SayElsewhere(const MetadataKey& oKey)
 {
     const auto oFound = moChanged.find(oKey);

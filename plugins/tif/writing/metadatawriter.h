@@ -30,7 +30,7 @@ private:
     void FindChanges(const krv::datasources::AuxiliaryData& oOld, const krv::datasources::AuxiliaryData& oNew);
     void Compare(unsigned int nChannel, const krv::datasources::MetadataMap& oOld,
                  const krv::datasources::MetadataMap& oNew);
-    // Whether a tag of its own says the value now, so that no item has to.
+    // Whether the key's tag says the value now, so that no item has to.
     bool StoreInTag(const std::string& key, const std::string& value);
     bool StoreText(std::uint16_t nTag, const std::string& value);
     bool StoreResolution(std::uint16_t nTag, const std::string& value);

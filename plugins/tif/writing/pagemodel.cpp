@@ -1,5 +1,6 @@
 #include "plugins/tif/writing/pagemodel.h"
 
+#include "plugins/tif/writing/strileencoder.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -190,6 +191,7 @@ PageSummary PageModel::Summarise() const
     oPage.mbReduced =
         (nKind & FILETYPE_REDUCEDIMAGE) != 0 || moTags.GetNumber(TIFFTAG_OSUBFILETYPE, 0) == OFILETYPE_REDUCEDIMAGE;
     oPage.mbMask = (nKind & FILETYPE_MASK) != 0;
+    oPage.mbBelowFirst = mbBelowFirst;
     oPage.mbPage = (nKind & FILETYPE_PAGE) != 0;
     const Tag* const pText = moTags.Find(TIFFTAG_IMAGEDESCRIPTION);
     // One that is not in memory is long.
@@ -238,8 +240,8 @@ std::shared_ptr<PageModel> MakeReducedPage(const PageModel& oFull, std::uint32_t
         if (const Tag* pTag = oFull.moTags.Find(nTag))
             oTags.Set(CopyTag(*pTag));
     const std::uint64_t nCompression = oTags.GetNumber(TIFFTAG_COMPRESSION, COMPRESSION_NONE);
-    if (nCompression >= COMPRESSION_CCITTRLE && nCompression <= COMPRESSION_CCITTFAX4)
-        oTags.SetNumber(TIFFTAG_COMPRESSION, TIFF_SHORT, COMPRESSION_ADOBE_DEFLATE); // facsimile is only read
+    if (!StrileEncoder::CanEncode(static_cast<std::uint16_t>(nCompression)))
+        oTags.SetNumber(TIFFTAG_COMPRESSION, TIFF_SHORT, COMPRESSION_ADOBE_DEFLATE); // that one is only read
     oTags.SetNumber(TIFFTAG_IMAGEWIDTH, TIFF_LONG, nWidth);
     oTags.SetNumber(TIFFTAG_IMAGELENGTH, TIFF_LONG, nHeight);
     if (oFull.IsTiled())

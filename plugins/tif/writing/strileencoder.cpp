@@ -66,6 +66,13 @@ StrileEncoder::StrileEncoder(Page& oPage, PixelUse eUse, std::optional<int> oLev
 
 StrileEncoder::~StrileEncoder() = default;
 
+bool StrileEncoder::CanEncode(std::uint16_t nCompression)
+{
+    return nCompression == COMPRESSION_NONE || IsOwnCodec(nCompression) ||
+           ((IsLibraryCodec(nCompression) || nCompression == COMPRESSION_JPEG) &&
+            TIFFIsCODECConfigured(nCompression) != 0);
+}
+
 std::string StrileEncoder::FindObstacle() const
 {
     const SampleForm& oSample = moForm.moSample;
@@ -78,8 +85,7 @@ std::string StrileEncoder::FindObstacle() const
         return "a compression that would change its bits";
     if (mpoJpeg)
         return mpoJpeg->GetObstacle();
-    if (moForm.mnCompression != COMPRESSION_NONE && !IsOwnCodec(moForm.mnCompression) &&
-        !(IsLibraryCodec(moForm.mnCompression) && TIFFIsCODECConfigured(moForm.mnCompression) != 0))
+    if (!CanEncode(moForm.mnCompression))
         return "the compression " + std::to_string(moForm.mnCompression);
     return {};
 }

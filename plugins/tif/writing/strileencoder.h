@@ -29,6 +29,9 @@ public:
     StrileEncoder(Page& oPage, PixelUse eUse, std::optional<int> oLevel);
     ~StrileEncoder();
 
+    // Whether there is an encoder for a compression.
+    static bool CanEncode(std::uint16_t nCompression);
+
     // Throws DataException for a page whose pixels cannot be written.
     void CheckWritable(const Place& oPlace = Place::Current()) const;
 

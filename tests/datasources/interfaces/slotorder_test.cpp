@@ -10,6 +10,7 @@
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/ioverviewio.h"
 #include "datasources/interfaces/ioverviewmanager.h"
+#include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
@@ -112,6 +113,7 @@ std::vector<Table> Tables()
          {Slot(&PC::GetPCTList), Slot(&PC::GetPCT), Slot(&PC::GetPCTChannel), Slot(&PC::GetPCTDescription),
           Slot(&PC::CreatePCT), Slot(&PC::UpdatePCT), Slot(&PC::SetPCTDescription), Slot(&PC::DeletePCT)}},
         {"IStorageDataset", {Slot(&IStorageDataset::GetUnusedBytes)}},
+        {"IPagedDataset", {Slot(&IPagedDataset::CountFurtherImages)}},
         {"IHistoryIO",
          {Slot(&IHistoryIO::ReadHistory), Slot(&IHistoryIO::AppendHistory), Slot(&IHistoryIO::ClearHistory)}},
         {"IMathModelDataset",

@@ -4,12 +4,15 @@
 #include "tests/support/facts.h"
 #include "tests/support/tiffwriter.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/icrs.h"
 
 #include <algorithm>
+#include <cstring>
 #include <ctime>
 #include <filesystem>
 #include <fstream>
+#include <functional>
 #include <random>
 
 #include <gtest/gtest.h>
@@ -25,6 +28,22 @@ Bytes ReadBytes(const std::string& fileName)
     const std::string bytes = ReadFile(fileName);
     return {bytes.begin(), bytes.end()};
 }
+
+// Hands the warnings of its lifetime on.
+class Warnings
+{
+public:
+    explicit Warnings(std::function<void(const std::string&)> oTake)
+        : moFormer(krv::nspio::Warning::SetSink(
+              [oTake = std::move(oTake)](const std::string& message, const std::string&, unsigned int)
+              { oTake(message); }))
+    {
+    }
+    ~Warnings() { krv::nspio::Warning::SetSink(moFormer); }
+
+private:
+    krv::nspio::Warning::Sink moFormer;
+};
 
 // Of the processor: a busy machine is no fault of the format.
 double Seconds()
@@ -42,10 +61,17 @@ void ReadCorner(krv::datasources::IRasterIO& oIO, std::size_t nPixelBytes, bool 
                    oBuffer.data());
 }
 
-// Asks a file everything. Returns the message of the first exception; anything that is no krv::Exception passes.
+// Asks a file everything. Returns the message of the first exception or warning; anything that is no krv::Exception
+// passes.
 std::string UseFile(const std::string& fileName)
 {
     std::string first;
+    const Warnings oWarnings(
+        [&first](const std::string& message)
+        {
+            if (first.empty())
+                first = message;
+        });
     const auto Try = [&first](auto oStep)
     {
         try
@@ -334,6 +360,29 @@ TEST(TifHostile, ChainsOfDirectoriesThatNeverEndDoNotHang)
     // A chain into itself.
     WriteBytes(file, Handmade::Image(16, 16, 16, 1, 1, 400, 256).Finish(8, 1000));
     EXPECT_NE(UseFile(file).find("circle"), std::string::npos);
+    // What lies before the break is there, with one warning.
+    MakeFile(file, RECIPES[0]);
+    Bytes oPages = ReadBytes(file);
+    std::size_t nNext = 4;
+    for (int nPage = 0; nPage < 2; ++nPage)
+    {
+        std::uint32_t nOffset = 0;
+        std::memcpy(&nOffset, &oPages[nNext], 4);
+        nNext = nOffset + 2 + std::size_t{12} * oPages[nOffset];
+    }
+    std::memset(&oPages[nNext], 0x7F, 4);
+    WriteBytes(file, oPages);
+    std::vector<std::string> oSaid;
+    const Warnings oWarnings([&oSaid](const std::string& message) { oSaid.push_back(message); });
+    for (int nTime = 0; nTime < 2; ++nTime)
+    {
+        const TifPointer poFile = OpenTif(file);
+        const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poFile->GetOverviewManager());
+        EXPECT_EQ(poLevels->GetLevels(), std::vector<unsigned int>{2});
+        EXPECT_TRUE(poFile->GetBitmapList().empty());
+        ASSERT_EQ(oSaid.size(), nTime + 1u);
+        EXPECT_NE(oSaid[0].find(file + ": levels and masks are listed only"), std::string::npos) << oSaid[0];
+    }
     // Directories of one entry, so many as the file holds.
     Bytes oBytes = Handmade::Image(16, 16, 16, 1, 1, 400, 256).Finish(1000, 1000);
     for (std::uint32_t nAt = 0; nAt < 200000; ++nAt)
@@ -431,6 +480,80 @@ TEST(TifHostile, PixelsThatACodecMadeUpAreRefused)
         WriteBytes(file, oBytes);
         EXPECT_NE(UseFile(file), "") << oRecipe.compression;
     }
+}
+
+// Some cameras and writers pad a stream before a marker.
+TEST(TifHostile, BytesBeforeAMarkerOfJpegAreNoDamage)
+{
+    const TempFolder oFolder;
+    const std::string sound = oFolder.File("sound.tif"), padded = oFolder.File("padded.tif");
+    const Bytes oPixels = MakePixels(16, 16, 1, krv::gobs::eDT_8U, 3);
+    const TifPointer poNew = CreateTif(sound, "COMPRESS=JPEG TILED=NO", 16, 16, 1, krv::gobs::eDT_8U);
+    WriteAll(*poNew, oPixels);
+    poNew->Close();
+    Bytes oStream(4096);
+    {
+        const TiffFile poTiff(TIFFOpen(sound.c_str(), "r"));
+        oStream.resize(static_cast<std::size_t>(TIFFReadRawStrip(poTiff.get(), 0, oStream.data(), 4096)));
+    }
+    oStream.insert(oStream.begin() + 2, 5, 0);
+    Bytes oFile = Handmade::Image(16, 16, 16, 7, 1, 400, static_cast<std::uint32_t>(oStream.size())).Finish(0, 400);
+    oFile.insert(oFile.end(), oStream.begin(), oStream.end());
+    WriteBytes(padded, oFile);
+    EXPECT_EQ(UseFile(padded), "");
+    EXPECT_EQ(ReadAll(*OpenTif(padded)), ReadAll(*OpenTif(sound)));
+}
+
+TEST(TifHostile, MessagesSayDamagedOrUnknownAndNothingOfLibtiff)
+{
+    const auto Deflated = [](std::uint16_t nTag, std::uint32_t nValue, std::uint16_t nBits)
+    {
+        Handmade oFile = Handmade::Image(16, 16, 16, 8, 1, 400, 256, nBits);
+        oFile.Add(nTag, 3, 1, nValue);
+        return oFile.Finish(0, 1000);
+    };
+    const std::pair<Bytes, const char*> CASES[] = {
+        {Deflated(TIFFTAG_PREDICTOR, 4, 64),
+         "predictor 4, which no reader knows,; the file is of a kind that is not read"},
+        {Deflated(TIFFTAG_PREDICTOR, 2, 4), "of a kind that is not read"},
+        {Deflated(TIFFTAG_PREDICTOR, 3, 8), "of a kind that is not read"},
+        {Deflated(TIFFTAG_PREDICTOR, 1, 8), "strip 0: "},
+        {Handmade::Image(16, 16, 16, 7, 1, 400, 256).Finish(0, 1000), "its data make no sense; the file is damaged"},
+        {Handmade::Image(16, 16, 16, 34712, 1, 400, 256).Finish(0, 1000), "the file is of a kind that is not read"},
+        {Handmade::Image(16, 0, 16, 1, 1, 400, 256).Finish(0, 1000), "the file is damaged"}};
+    const TempFolder oFolder;
+    for (const auto& [oBytes, pWords] : CASES)
+    {
+        const std::string file = oFolder.File("file.tif");
+        WriteBytes(file, oBytes);
+        EXPECT_NE(UseFile(file).find(pWords), std::string::npos) << UseFile(file);
+    }
+}
+
+// Nothing of it is lost, and it is told.
+TEST(TifHostile, ATag42112ThatIsNoXmlIsNamedAndKept)
+{
+    const std::string text = "<GDALMetadata><Item name=\"\xE4\">1</Item></GDALMetadata>";
+    Handmade oFile = Handmade::Image(16, 16, 16, 1, 1, 400, 256);
+    oFile.Add(42112, 2, static_cast<std::uint32_t>(text.size() + 1), 700);
+    Bytes oBytes = oFile.Finish(0, 1000);
+    std::copy(text.begin(), text.end(), oBytes.begin() + 700);
+    const TempFolder oFolder;
+    const std::string file = oFolder.File("file.tif");
+    WriteBytes(file, oBytes);
+    EXPECT_NE(UseFile(file).find(file + ": tag 42112"), std::string::npos) << UseFile(file);
+    const Warnings oQuiet([](const std::string&) {});
+    for (const bool bWritten : {false, true})
+    {
+        krv::datasources::AuxiliaryData oData = OpenTif(file)->ReadAuxiliaryData();
+        EXPECT_EQ(oData.GetFileMetadataValue("MetadataXML"), text);
+        EXPECT_EQ(oData.GetFileMetadataValue("Own"), bWritten ? "x" : "");
+        const TifPointer poFile = OpenTif(file, eUpdate);
+        oData.SetFileMetadataValue("Own", "x");
+        poFile->WriteAuxiliaryData(oData);
+        poFile->Close();
+    }
+    EXPECT_EQ(UseFile(file), "");
 }
 
 TEST(TifHostile, OnlyTiffFilesAreClaimed)

@@ -409,7 +409,7 @@ TEST(TifUpdate, MetadataComeBackByteForByteAndForeignItemsStay)
         {
             const auto oFound = oRead.GetFileMetadata().find(key);
             ASSERT_NE(oFound, oRead.GetFileMetadata().end()) << key.substr(0, 99);
-            EXPECT_EQ(oFound->second, value) << key.substr(0, 99);
+            EXPECT_TRUE(oFound->first == key && oFound->second == value) << key.substr(0, 99);
         }
         for (unsigned int nChannel = 1; nChannel <= 4; ++nChannel)
         {
