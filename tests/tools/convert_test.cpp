@@ -278,6 +278,11 @@ TEST(Convert, BitmapsAreCut)
         expected[30 + nBitmap] = 1;
         EXPECT_EQ(ReadPixels(oReader), expected);
     }
+    // The bitmaps of a later file of a stack say nothing of the first one's channels.
+    const auto oStack = RunConvert({oFolder.File("a.dem"), file, oFolder.File("stack.tif")});
+    EXPECT_NE(oStack.errors.find("those of the first file"), std::string::npos) << oStack.errors;
+    const auto poStack = OpenFile(oFolder.File("stack.tif"), eReadOnly);
+    EXPECT_TRUE(dynamic_cast<krv::datasources::IBitmapDataset&>(*poStack).GetBitmapList().empty());
 }
 
 TEST(Convert, FailuresLeaveNothingBehindAndTheOldFileAsItWas)

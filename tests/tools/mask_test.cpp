@@ -3,8 +3,10 @@
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/irasterdataset.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/reader/basicreader.h"
+#include "gobs/raster/rasterinfo.h"
 #include "tests/support/demofile.h"
 #include "tests/support/facts.h"
 #include "tests/support/pixels.h"
@@ -163,6 +165,16 @@ TEST_F(MaskCommand, LongEdgesBendBetweenReferenceSystems)
     EXPECT_EQ(Set("POLYGON((270 25,300 25,300 40,270 40,270 25))"), nHalf);
     EXPECT_EQ(Set("POLYGON((-180 -80,180 -80,180 84,-180 84,-180 -80))"), int{WIDTH * HEIGHT});
     EXPECT_EQ(Set("POLYGON((0 -80,90 -80,90 84,0 84))"), 0);
+    // A file whose surroundings are the whole turn.
+    constexpr double STEP = 20037508.34 / 20;
+    const std::unique_ptr<IDataset> oWorld(
+        krv::datasources::DatasetManager::GetInstance()->NewDataset(moFolder.File("world.tif"), "TIF", ""));
+    dynamic_cast<krv::datasources::IRasterDataset&>(*oWorld).Create({40, 40, 1, krv::gobs::eDT_8U});
+    dynamic_cast<krv::datasources::IGeocodedDataset&>(*oWorld).SetGeocoding({-20 * STEP, STEP, 0, 20 * STEP, 0, -STEP});
+    oWorld->UpdateCRS(*krv::ogc::cs::CreateCRSFromEPSG(3857));
+    oWorld->Close();
+    moFile = moFolder.File("world.tif");
+    EXPECT_EQ(Set("POLYGON((-90 -80,90 -80,90 80,-90 80))"), 20 * 32);
 }
 
 TEST_F(MaskCommand, NoDataIsStoredAsItsComplement)
