@@ -305,13 +305,23 @@ private:
         const std::size_t nValues = oBoxes.mnBoxes * mnSamples;
         std::memset(pValid, 1, nValues);
         using Vectors = VectorsOf<Count>;
-        const auto oWhole = typename Vectors::Samples{} + static_cast<Count>(nWhole);
+        const typename Vectors::Samples oNone{};
+        const auto oWhole = oNone + static_cast<Count>(nWhole);
         bool bAll = true;
         for (std::size_t n = 0; n < nValues;)
         {
-            // Most are whole, many in a row.
-            if (n + Vectors::LANES <= nValues && std::memcmp(pCounts + n, &oWhole, sizeof oWhole) == 0)
+            // Most are whole or empty, many in a row.
+            const bool bMany = n + Vectors::LANES <= nValues;
+            if (bMany && std::memcmp(pCounts + n, &oWhole, sizeof oWhole) == 0)
             {
+                n += Vectors::LANES;
+                continue;
+            }
+            if (bMany && std::memcmp(pCounts + n, &oNone, sizeof oNone) == 0)
+            {
+                std::memset(pPixels + n * sizeof(T), 0, Vectors::LANES * sizeof(T));
+                std::memset(pValid + n, 0, Vectors::LANES);
+                bAll = false;
                 n += Vectors::LANES;
                 continue;
             }
