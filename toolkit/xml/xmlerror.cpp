@@ -1,6 +1,6 @@
 #include "toolkit/xml/xmlerror.h"
 
-#include "toolkit/xml/xmlexception.h"
+#include "toolkit/xml/detail/xmlexception.h"
 #include "toolkit/xml/xmlutil.h"
 
 #include <xalanc/PlatformSupport/XSLException.hpp>
@@ -30,7 +30,7 @@ std::string DescribeRaw()
     }
     catch (const xercesc::SAXParseException& oException)
     {
-        return ParseException(oException).what();
+        return detail::ParseException(oException).what();
     }
     catch (const xercesc::SAXException& oException)
     {
@@ -67,7 +67,7 @@ std::string DescribeCurrentException()
 
 bool IsParseException(const std::exception& oException)
 {
-    return dynamic_cast<const ParseException*>(&oException) != nullptr;
+    return dynamic_cast<const detail::ParseException*>(&oException) != nullptr;
 }
 
 } // namespace krv::xml

@@ -13,7 +13,7 @@ namespace krv::xml
 // use in a catch block only, so that callers can report XML failures without the XML library's headers.
 KRV_TOOLKIT_API std::string DescribeCurrentException();
 
-// Whether an exception is the XML parser's (ParseException of xmlexception.h).
+// Whether an exception is the XML parser's: what the parsers of this folder throw is that and a std::exception at once.
 KRV_TOOLKIT_API bool IsParseException(const std::exception& oException);
 
 } // namespace krv::xml

@@ -1,6 +1,6 @@
 #include "toolkit/xml/detail/saxreader.h"
 
-#include "toolkit/xml/xmlexception.h"
+#include "toolkit/xml/detail/xmlexception.h"
 #include "toolkit/xml/xmlutil.h"
 
 #include <xercesc/framework/MemBufInputSource.hpp>

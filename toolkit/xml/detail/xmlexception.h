@@ -7,10 +7,10 @@
 
 #include <xercesc/sax/SAXParseException.hpp>
 
-namespace krv::xml
+namespace krv::xml::detail
 {
 
-// What the parsers of this folder throw: the XML parser's own exception, and a std::exception at once for programs that
+// What the parsers above throw: the XML parser's own exception, and a std::exception at once for programs that
 // know nothing of that library. what() is "file:line:column: message", without the numbers where there are none.
 class KRV_TOOLKIT_API ParseException : public xercesc::SAXParseException, public std::exception
 {
@@ -26,4 +26,4 @@ private:
     std::string moDescription;
 };
 
-} // namespace krv::xml
+} // namespace krv::xml::detail

@@ -1,8 +1,8 @@
-#include "toolkit/xml/xmlexception.h"
+#include "toolkit/xml/detail/xmlexception.h"
 
 #include "toolkit/xml/xmlutil.h"
 
-namespace krv::xml
+namespace krv::xml::detail
 {
 
 ParseException::ParseException(const xercesc::SAXParseException& oException)
@@ -22,4 +22,4 @@ const char* ParseException::what() const noexcept
     return moDescription.c_str();
 }
 
-} // namespace krv::xml
+} // namespace krv::xml::detail
