@@ -43,7 +43,7 @@ private:
 
 // Parse a file (its name in the bytes of the file system) or bytes in memory; name stands in the messages.
 // Whatever is wrong (no such file, not a regular file, not readable, malformed, beyond the limits of limits.h, holding
-// a document type declaration) is thrown as a class below xercesc::SAXParseException and std::exception. Nothing outside
+// a document type declaration) is thrown as a class below xercesc::SAXParseException and std::exception. Nothing
 // outside the document is ever read, and nothing is printed.
 KRV_TOOLKIT_API Document ParseFile(const std::string& fileName);
 KRV_TOOLKIT_API Document ParseMemory(const void* poData, std::size_t nBytes, const std::string& name);
