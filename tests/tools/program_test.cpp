@@ -148,7 +148,9 @@ TEST(Command, ViewMakesMissingPixelsTransparent)
     EXPECT_EQ(oPixels[(50 * 100 + 50) * 4 + 3], 255);
     ASSERT_EQ(RunKrv({"view", SceneFolder() + "/pan.tif", target, "--size", "5000"}).code, 0);
     EXPECT_EQ(ReadPng(target, oPixels).width, 300U);
+    EXPECT_EQ(RunKrv({"view", SceneFolder() + "/pan.tif", target, "--stretch", "MinMax"}).code, 0);
     std::filesystem::remove(target);
+    ExpectFailure(RunKrv({"view", "a", "b", "--stretch", "much"}), 2, {"much"});
     ExpectFailure(RunKrv({"view", SceneFolder() + "/pan.tif", oFolder.GetPath() + "/no/look.png"}), 1,
                   {"no/look.png", "there is no folder"});
     ASSERT_EQ(mkfifo(target.c_str(), 0600), 0);
