@@ -82,6 +82,13 @@ std::uint32_t PageForm::GetStrileRows(std::uint32_t nStrileRow) const
     return mbTiled ? mnStrileHeight : std::min(mnStrileHeight, mnHeight - nStrileRow * mnStrileHeight);
 }
 
+StrileShape PageForm::GetShape() const
+{
+    const bool bOnlyStrips = !mbTiled && mnStrilesDown == 1 && GetStriles() <= StrileShape::MOST_ONLY_STRIPS;
+    const bool bPlain = bOnlyStrips && mnCompression == COMPRESSION_NONE;
+    return {GetStriles(), bOnlyStrips, bPlain ? GetStoredRowBytes(mnWidth) * mnHeight : 0};
+}
+
 bool PageForm::IsOwnCodec() const
 {
     switch (mnCompression)
@@ -122,7 +129,7 @@ Page::Page(std::shared_ptr<const support::File> poFile, const FileHeader& oHeade
     CheckCodec();
     CheckPhotometric();
     CheckSizes();
-    mpoStriles = std::make_unique<StrileTable>(*mpoFile, moDirectory, oHeader.mbBigEndian, moForm.GetStriles());
+    mpoStriles = std::make_unique<StrileTable>(*mpoFile, moDirectory, oHeader.mbBigEndian, moForm.GetShape());
 }
 
 Page::~Page() = default;

@@ -41,6 +41,7 @@ struct PageForm
     unsigned int GetPlaneChannels() const { return mbSeparate ? 1u : mnChannels; }
     unsigned int GetPlanes() const { return mbSeparate ? mnChannels : 1u; }
     std::uint64_t GetStriles() const { return std::uint64_t{mnStrilesAcross} * mnStrilesDown * GetPlanes(); }
+    StrileShape GetShape() const;
     // Bytes of a stored row of nPixels, and of the same row as handed out.
     std::uint64_t GetStoredRowBytes(std::uint64_t nPixels) const
     {

@@ -19,9 +19,9 @@ RowSource::~RowSource() = default;
 bool RowSource::IsStored(unsigned int nPlane, std::uint32_t nRow)
 {
     const PageForm& oForm = mpoPage->GetForm();
-    const Strile oStrile =
-        mpoPage->GetStriles().Get(std::uint64_t{nPlane} * oForm.mnStrilesDown + nRow / oForm.mnStrileHeight);
-    return oStrile.mnBytes != 0 || !oStrile.mbBytesKnown;
+    return mpoPage->GetStriles()
+        .Get(std::uint64_t{nPlane} * oForm.mnStrilesDown + nRow / oForm.mnStrileHeight)
+        .IsStored();
 }
 
 // Codecs go forward only: rows before the wanted one are decoded too, from where the last call ended when it was in the

@@ -112,18 +112,11 @@ void StrileSource::ReadStrips(const support::BlockAddress& oBlock, const support
     }
 }
 
-// The strip of an uncompressed image without others may claim any size: writers got it wrong, the data are there.
-bool StrileSource::IsStored(const Strile& oStrile) const
-{
-    return oStrile.mnBytes != 0 || !oStrile.mbBytesKnown ||
-           (mbPlain && !moForm.mbTiled && moForm.mnStrilesDown == 1 && oStrile.mnOffset != 0);
-}
-
 std::uint32_t StrileSource::ReadPiece(const Piece& oPiece, std::uint32_t nRowsWanted)
 {
     const Strile oStrile = mpoPage->GetStriles().Get(oPiece.mnStrile);
     std::uint32_t nRows = oPiece.moWanted.mnRows;
-    if (!IsStored(oStrile))
+    if (!oStrile.IsStored())
         Clear(oPiece.moWanted);
     else if (oStrile.mnOffset == 0)
         mpoPage->Fail(moDecoder.Describe(oPiece.mnStrile) + ": its offset is 0");
@@ -140,8 +133,7 @@ void StrileSource::CheckPlainBytes(const Piece& oPiece, const Strile& oStrile) c
 {
     const std::uint64_t nWanted =
         (std::uint64_t{oPiece.mnY} + oPiece.moWanted.mnRows) * moForm.GetStoredRowBytes(moForm.mnStrileWidth);
-    const bool bOnlyStrip = !moForm.mbTiled && moForm.mnStrilesDown == 1;
-    if (oStrile.mbBytesKnown && oStrile.mnBytes < nWanted && !bOnlyStrip)
+    if (oStrile.mbBytesKnown && oStrile.mnBytes < nWanted)
         mpoPage->Fail(moDecoder.Describe(oPiece.mnStrile) + ": it holds " + std::to_string(oStrile.mnBytes) +
                       " bytes, " + std::to_string(nWanted) + " are wanted");
     if (oStrile.mnOffset > mpoPage->GetFile().GetSize())
@@ -163,7 +155,7 @@ std::uint32_t StrileSource::ReadPlain(Piece oPiece, const Strile& oStrile, std::
         oPiece.mnStoredRows = moForm.GetStrileRows(oPiece.mnStrile % moForm.mnStrilesDown);
         oPiece.moWanted.mnRows = std::min(oPiece.mnStoredRows, nRowsWanted - oWanted.mnRows);
         const Strile oFollowing = mpoPage->GetStriles().Get(oPiece.mnStrile);
-        if (oFollowing.mnOffset != nNext || !IsStored(oFollowing))
+        if (oFollowing.mnOffset != nNext || !oFollowing.IsStored())
             break;
         CheckPlainBytes(oPiece, oFollowing);
         oWanted.mnRows += oPiece.moWanted.mnRows;

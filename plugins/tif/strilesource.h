@@ -63,7 +63,6 @@ private:
     std::uint32_t ReadPlain(Piece oPiece, const Strile& oStrile, std::uint32_t nRowsWanted);
     void ReadCoded(const Piece& oPiece, const Strile& oStrile);
     unsigned char* ReadRaw(const Piece& oPiece, const Strile& oStrile);
-    bool IsStored(const Strile& oStrile) const;
     void CheckPlainBytes(const Piece& oPiece, const Strile& oStrile) const;
     void Clear(const WantedPixels& oWanted) const;
     void ToBits(const WantedPixels& oWanted) const;

@@ -18,6 +18,11 @@ const DirectoryEntry* FindEither(const RawDirectory& oDirectory, std::uint16_t n
     return pEntry != nullptr ? pEntry : oDirectory.Find(nSecond);
 }
 
+bool IsLongEnough(const Strile& oStrip, const StrileShape& oShape)
+{
+    return oStrip.mnBytes >= std::max<std::uint64_t>(1, oShape.mnPlainBytes);
+}
+
 } // namespace
 
 StrileArray::StrileArray(const support::File& oFile, const DirectoryEntry& oEntry, bool bBigEndian)
@@ -68,24 +73,42 @@ StrileEntries::StrileEntries(const RawDirectory& oDirectory)
 
 IStrileIndex::~IStrileIndex() = default;
 
+std::uint64_t FindOnlyStripBytes(const Strile& oStrip, const StrileShape& oShape, const RawDirectory& oDirectory,
+                                 const std::vector<std::uint64_t>& oOffsets, std::uint64_t nFileBytes)
+{
+    if (IsLongEnough(oStrip, oShape))
+        return oShape.mnPlainBytes != 0 ? oShape.mnPlainBytes : oStrip.mnBytes;
+    std::uint64_t nNext = std::max(nFileBytes, oStrip.mnOffset);
+    const auto Bound = [&](std::uint64_t nOffset)
+    {
+        nNext = nOffset > oStrip.mnOffset ? std::min(nNext, nOffset) : nNext;
+    };
+    Bound(oDirectory.GetOffset());
+    Bound(oDirectory.GetNext());
+    for (const DirectoryEntry& oEntry : oDirectory.GetEntries())
+        Bound(oEntry.mnOffset);
+    for (const std::uint64_t nOffset : oOffsets)
+        Bound(nOffset);
+    const std::uint64_t nRest = nNext - oStrip.mnOffset;
+    return oShape.mnPlainBytes != 0 ? std::max(oStrip.mnBytes, std::min(nRest, oShape.mnPlainBytes)) : nRest;
+}
+
 StrileTable::StrileTable(const support::File& oFile, const RawDirectory& oDirectory, bool bBigEndian,
-                         std::uint64_t nStriles)
-    : moFile(oFile)
+                         const StrileShape& oShape)
+    : moFile(oFile), moDirectory(oDirectory), moShape(oShape)
 {
     const StrileEntries oEntries(oDirectory);
     if (oEntries.mpOffsets == nullptr)
         throw FileFormatException(oFile.GetName(), oFile.GetName() + ": the directory does not say where the " +
-                                                       std::to_string(nStriles) + " strips or tiles lie");
+                                                       std::to_string(oShape.mnCount) + " strips or tiles lie");
     moOffsets = StrileArray(oFile, *oEntries.mpOffsets, bBigEndian);
     mbByteCounts = oEntries.mpByteCounts != nullptr;
     if (mbByteCounts)
         moByteCounts = StrileArray(oFile, *oEntries.mpByteCounts, bBigEndian);
 }
 
-Strile StrileTable::Get(std::uint64_t nIndex)
+Strile StrileTable::Read(std::uint64_t nIndex)
 {
-    if (mpoIndex)
-        return mpoIndex->Get(nIndex);
     if (nIndex >= moOffsets.GetCount() || (mbByteCounts && nIndex >= moByteCounts.GetCount()))
         throw FileFormatException(moFile.GetName(),
                                   moFile.GetName() + ": the directory lists " + std::to_string(moOffsets.GetCount()) +
@@ -94,6 +117,20 @@ Strile StrileTable::Get(std::uint64_t nIndex)
     oStrile.mnOffset = moOffsets.Get(moFile, nIndex);
     oStrile.mbBytesKnown = mbByteCounts;
     oStrile.mnBytes = mbByteCounts ? moByteCounts.Get(moFile, nIndex) : 0;
+    if (!moShape.mbOnlyStrips || oStrile.mnOffset == 0 || IsLongEnough(oStrile, moShape))
+        return oStrile;
+    std::vector<std::uint64_t> oOffsets(std::min(moShape.mnCount, moOffsets.GetCount()));
+    for (std::uint64_t nAt = 0; nAt < oOffsets.size(); ++nAt)
+        oOffsets[nAt] = moOffsets.Get(moFile, nAt);
+    return {oStrile.mnOffset, FindOnlyStripBytes(oStrile, moShape, moDirectory, oOffsets, moFile.GetSize()), true};
+}
+
+Strile StrileTable::Get(std::uint64_t nIndex)
+{
+    const Strile oStrile = mpoIndex ? mpoIndex->Get(nIndex) : Read(nIndex);
+    if (oStrile.mbBytesKnown && oStrile.mnBytes == 0 && oStrile.mnOffset != 0)
+        throw FileFormatException(moFile.GetName(), moFile.GetName() + ": strip or tile " + std::to_string(nIndex) +
+                                                        " has a place in the file and no bytes");
     return oStrile;
 }
 

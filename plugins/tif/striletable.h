@@ -47,8 +47,11 @@ private:
 struct Strile
 {
     std::uint64_t mnOffset = 0;
-    std::uint64_t mnBytes = 0; // 0: not stored
-    bool mbBytesKnown = true;  // false when the file does not say
+    std::uint64_t mnBytes = 0;
+    bool mbBytesKnown = true; // false when the file does not say
+
+    // What is not stored has neither a place nor bytes, and reads as 0.
+    bool IsStored() const { return mnOffset != 0 || mnBytes != 0 || !mbBytesKnown; }
 };
 
 // The entries of a directory that list the strips or tiles; those of tiles count first. Null where there is none.
@@ -59,6 +62,22 @@ struct StrileEntries
 
     explicit StrileEntries(const RawDirectory& oDirectory);
 };
+
+// What of a page's form tells how long its strips or tiles are.
+struct StrileShape
+{
+    static constexpr std::uint64_t MOST_ONLY_STRIPS = 1024;
+
+    std::uint64_t mnCount = 0;
+    bool mbOnlyStrips = false;      // every plane is a single strip, and there are not very many
+    std::uint64_t mnPlainBytes = 0; // of such a strip without compression; 0 with one
+};
+
+// How long a single strip is. Writers got the byte counts of such files wrong: where there is none, or, without
+// compression, one too small for its rows, it reaches up to what the file is known to hold next.
+// oOffsets: of the strips of all planes.
+std::uint64_t FindOnlyStripBytes(const Strile& oStrip, const StrileShape& oShape, const RawDirectory& oDirectory,
+                                 const std::vector<std::uint64_t>& oOffsets, std::uint64_t nFileBytes);
 
 // Where strips and tiles lie while a file is being written: known in memory before it stands in the file.
 class IStrileIndex
@@ -72,17 +91,22 @@ public:
 class StrileTable
 {
 public:
-    // nStriles: how many the page's geometry calls for. Throws FileFormatException when the page has no offsets.
-    StrileTable(const support::File& oFile, const RawDirectory& oDirectory, bool bBigEndian, std::uint64_t nStriles);
+    // The directory outlives it. Throws FileFormatException when the page has no offsets.
+    StrileTable(const support::File& oFile, const RawDirectory& oDirectory, bool bBigEndian, const StrileShape& oShape);
 
-    // Throws FileFormatException for a strile that the file does not list.
+    // Throws FileFormatException for a strile that the file does not list, and for one with a place and no bytes: what
+    // it holds is not known.
     Strile Get(std::uint64_t nIndex);
 
     // From now on the index answers in place of the file.
     void Use(std::shared_ptr<const IStrileIndex> poIndex) { mpoIndex = std::move(poIndex); }
 
 private:
+    Strile Read(std::uint64_t nIndex);
+
     const support::File& moFile;
+    const RawDirectory& moDirectory;
+    StrileShape moShape;
     std::shared_ptr<const IStrileIndex> mpoIndex;
     StrileArray moOffsets;
     StrileArray moByteCounts;

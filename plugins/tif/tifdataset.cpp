@@ -1,6 +1,7 @@
 #include "plugins/tif/tifdataset.h"
 
 #include "datasources/metadata/auxiliarydata.h"
+#include "datasources/metadata/pixelstatistics.h"
 #include "gobs/pct/pct.h"
 #include "gobs/raster/rasterinfo.h"
 #include "plugins/support/rasterio.h"
@@ -244,8 +245,10 @@ krv::datasources::FileAccessState TifDataset::Delete()
 void TifDataset::Synchronize()
 {
     CheckOpen();
-    if (mpoEditor)
-        mpoEditor->Synchronize();
+    if (!mpoEditor)
+        return;
+    mpoEditor->Synchronize();
+    WatchImage();
 }
 
 krv::datasources::AccessCapabilities TifDataset::GetRasterCapabilities()
@@ -360,6 +363,7 @@ void TifDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData
             oRecord.SetChanMetadataValue(BookKey(oLevel.mnLevel),
                                          oBook.GetChanMetadataValue(BookKey(oLevel.mnLevel), nChannel), nChannel);
     Edit([&] { MetadataWriter(oEditor, oEditor.GetPages().front()).Write(oRecord, oPlace); });
+    WatchImage();
 }
 
 void TifDataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
@@ -830,23 +834,33 @@ void TifDataset::SetLevelValid(unsigned int nChannel, unsigned int nLevel, bool 
         WatchImage();
 }
 
-// The first change of the image's pixels makes its levels outdated.
+// The first change of the image's pixels makes its levels outdated, and what is recorded of their values. The record of
+// a file that has no name yet is that of the pixels to come.
 void TifDataset::WatchImage()
 {
     if (const std::shared_ptr<PageWriter> poWriter = mpoImageWriter.lock())
-        poWriter->OnChange([this] { InvalidateLevels(); });
+        poWriter->OnChange([this] { ForgetOldPixels(); });
 }
 
-void TifDataset::InvalidateLevels()
+void TifDataset::ForgetOldPixels()
 {
-    if (GetLevels(PixelUse::eImage).empty())
-        return;
     krv::datasources::AuxiliaryData oBook = GetBook(PixelUse::eImage);
+    const std::shared_ptr<PageModel> poModel = mpoEditor->GetPages().front();
+    const bool bStatistics = mpoEditor->IsNamed() && krv::datasources::DropStatistics(oBook);
+    const bool bRanges = mpoEditor->IsNamed() && poModel->HasRanges();
     const std::vector<PageLevel> oLevels = GetLevels(PixelUse::eImage);
     for (const PageLevel& oLevel : oLevels)
         for (unsigned int nChannel = 1; nChannel <= oBook.GetChannelCount(); ++nChannel)
             oBook.SetChanMetadataValue(BookKey(oLevel.mnLevel), INVALID, nChannel);
-    WriteBook(oBook, PixelUse::eImage, Place::Current());
+    if (!bStatistics && !bRanges && oLevels.empty())
+        return;
+    Edit(
+        [&]
+        {
+            if (bRanges)
+                mpoEditor->GetPages().front()->DropRanges();
+            MetadataWriter(*mpoEditor, mpoEditor->GetPages().front()).Write(oBook, Place::Current());
+        });
 }
 
 std::string TifDataset::GetResamplingName(PixelUse eUse) const

@@ -118,7 +118,7 @@ private:
     const krv::datasources::AuxiliaryData& GetBook(PixelUse eUse) const;
     void WriteBook(const krv::datasources::AuxiliaryData& oBook, PixelUse eUse, const Place& oPlace);
     void WatchImage();
-    void InvalidateLevels();
+    void ForgetOldPixels();
     void StorePCT(const krv::gobs::PCT& oTable, const Place& oPlace);
     std::unique_ptr<support::IBlockSource> MakeSource(const std::shared_ptr<PageModel>& poModel, PixelUse eUse);
     FileEditor& GetEditor(const char* pWhat, const Place& oPlace) const;

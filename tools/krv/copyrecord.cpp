@@ -1,6 +1,7 @@
 #include "tools/krv/copyrecord.h"
 
 #include "datasources/metadata/auxdatadefaultrgbgtfm.h"
+#include "datasources/metadata/pixelstatistics.h"
 #include "datasources/metadata/referencetag.h"
 #include "datasources/metadata/typednodata.h"
 
@@ -17,13 +18,13 @@ namespace krv::tool
 {
 
 using krv::datasources::AuxiliaryData;
+using krv::datasources::DropStatistics;
 using krv::datasources::MetadataMap;
 
 namespace
 {
 
 constexpr char NO_DATA[] = "NO_DATA_VALUE";
-constexpr char STATISTICS[] = "STATISTICS_";
 constexpr char CONTROL_POINTS[] = "GroundControlPoints";
 constexpr char POLYNOMIALS[] = "RPC";
 constexpr const char* TABLE_REFERENCES[] = {"DEFAULT_LUT_REF", "DEFAULT_PCT_REF"};
@@ -85,11 +86,6 @@ void MoveWithWindow(MetadataMap& oMap, const PixelWindow& oWindow)
     const auto oPolynomials = oMap.find(POLYNOMIALS);
     if (oPolynomials != oMap.end())
         oPolynomials->second = MovePolynomials(oPolynomials->second, oWindow);
-}
-
-void DropStatistics(MetadataMap& oMap)
-{
-    std::erase_if(oMap, [](const auto& oEntry) { return oEntry.first.starts_with(STATISTICS); });
 }
 
 // The first file's channels by their place in the copy; places of others match no number.

@@ -56,16 +56,13 @@ void ChannelEditor::Rebuild(const std::shared_ptr<PageModel>& poOld, const Place
 
 std::shared_ptr<PageModel> ChannelEditor::MakePage(PageModel& oOld) const
 {
-    constexpr std::uint16_t RANGES[] = {TIFFTAG_MINSAMPLEVALUE, TIFFTAG_MAXSAMPLEVALUE, TIFFTAG_SMINSAMPLEVALUE,
-                                        TIFFTAG_SMAXSAMPLEVALUE};
     const std::uint64_t nOldChannels = oOld.moTags.GetNumber(TIFFTAG_SAMPLESPERPIXEL, 1);
     auto poNew = std::make_shared<PageModel>(oOld.moTags.IsBigEndian());
     poNew->mnNumber = oOld.mnNumber;
     TagList& oTags = poNew->moTags;
     for (const Tag& oTag : oOld.moTags.GetTags())
         oTags.Set({oTag.mnTag, oTag.mnType, oTag.mnCount, oTag.moBytes, {}});
-    for (const std::uint16_t nTag : RANGES)
-        oTags.Remove(nTag);
+    poNew->DropRanges();
     for (const std::uint16_t nTag : {TIFFTAG_BITSPERSAMPLE, TIFFTAG_SAMPLEFORMAT})
         if (oTags.Find(nTag) != nullptr)
             oTags.SetNumbers(nTag, TIFF_SHORT, std::vector<std::uint64_t>(moSources.size(), oTags.GetNumber(nTag, 1)));
@@ -141,7 +138,7 @@ void ChannelEditor::CopyPixels(const std::shared_ptr<PageModel>& poOld, const st
     for (unsigned int nY = 0; nY < oLayout.GetHeight(); nY += std::min(nHeight, oLayout.GetHeight() - nY))
         for (unsigned int nX = 0; nX < oLayout.GetWidth(); nX += std::min(nWidth, oLayout.GetWidth() - nX), ++nStrile)
         {
-            if (poOld->moByteCounts[nStrile] == 0)
+            if (!poOld->Get(nStrile).IsStored())
                 continue;
             const support::PixelRect oRect{nX, nY, std::min(nWidth, oLayout.GetWidth() - nX),
                                            std::min(nHeight, oLayout.GetHeight() - nY)};

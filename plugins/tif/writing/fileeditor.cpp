@@ -280,6 +280,17 @@ void FileEditor::ReadStriles(PageModel& oPage, const RawDirectory& oDirectory)
         oPage.moByteCounts[nAt] = oCounts.Get(*mpoFile, nAt);
     }
     oPage.moRoom = oPage.moByteCounts;
+    const StrileShape oShape = oPage.GetShape();
+    for (std::uint64_t nAt = 0; oShape.mbOnlyStrips && nAt < nStriles; ++nAt)
+    {
+        const Strile oStrip = oPage.Get(nAt);
+        if (oStrip.mnOffset == 0)
+            continue;
+        oPage.moByteCounts[nAt] = FindOnlyStripBytes(oStrip, oShape, oDirectory, oPage.moOffsets, mpoFile->GetSize());
+        // Room that its directory does not claim is not given up with it.
+        if (oPage.moByteCounts[nAt] != oStrip.mnBytes)
+            oPage.moRoom[nAt] = 0;
+    }
     // What is added to the file would otherwise be taken for what is missing.
     for (std::uint64_t nAt = 0; nAt < nStriles; ++nAt)
         if (oPage.moByteCounts[nAt] > mpoFile->GetSize() ||

@@ -87,6 +87,18 @@ Handle Open(Memory& oMemory, bool bBigEndian)
             &TIFFClose};
 }
 
+// From 6 on presets differ in the size of their dictionary alone, which takes eleven times its size in memory: one
+// larger than the block is of no use.
+int ChoosePreset(std::optional<int> oLevel, std::uint64_t nBytes)
+{
+    constexpr int USUAL = 6;
+    constexpr std::uint64_t USUAL_BYTES = std::uint64_t{8} << 20;
+    int nEnough = USUAL;
+    while (nEnough < 9 && nBytes > USUAL_BYTES << (nEnough - USUAL))
+        ++nEnough;
+    return std::min(oLevel.value_or(USUAL), nEnough);
+}
+
 void Describe(TIFF* poTiff, const PageForm& oForm, std::uint32_t nRows, std::optional<int> oLevel)
 {
     TIFFSetField(poTiff, TIFFTAG_IMAGEWIDTH, oForm.mnStrileWidth);
@@ -105,10 +117,15 @@ void Describe(TIFF* poTiff, const PageForm& oForm, std::uint32_t nRows, std::opt
         TIFFSetField(poTiff, TIFFTAG_ROWSPERSTRIP, nRows);
     if (oForm.mnPredictor != PREDICTOR_NONE)
         TIFFSetField(poTiff, TIFFTAG_PREDICTOR, static_cast<int>(oForm.mnPredictor));
-    if (oForm.moSample.moNativeType.IsReal())
+    // After the bits: by both libtiff knows which bytes of a sample are to be turned round.
+    const bool bReal = oForm.moSample.moNativeType.IsReal();
+    if (oForm.moSample.mnParts == 2)
+        TIFFSetField(poTiff, TIFFTAG_SAMPLEFORMAT, bReal ? SAMPLEFORMAT_COMPLEXIEEEFP : SAMPLEFORMAT_COMPLEXINT);
+    else if (bReal)
         TIFFSetField(poTiff, TIFFTAG_SAMPLEFORMAT, SAMPLEFORMAT_IEEEFP);
-    if (oForm.mnCompression == COMPRESSION_LZMA && oLevel)
-        TIFFSetField(poTiff, TIFFTAG_LZMAPRESET, *oLevel);
+    if (oForm.mnCompression == COMPRESSION_LZMA)
+        TIFFSetField(poTiff, TIFFTAG_LZMAPRESET,
+                     ChoosePreset(oLevel, oForm.GetStoredRowBytes(oForm.mnStrileWidth) * nRows));
 }
 
 } // namespace

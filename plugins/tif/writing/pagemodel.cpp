@@ -17,6 +17,8 @@ namespace
 constexpr std::uint32_t TILE_SIDE = 256;
 constexpr std::uint64_t STRIP_BYTES = std::uint64_t{256} << 10;
 constexpr std::uint32_t TILE_UNIT = 16;
+constexpr std::uint16_t RANGES[] = {TIFFTAG_MINSAMPLEVALUE, TIFFTAG_MAXSAMPLEVALUE, TIFFTAG_SMINSAMPLEVALUE,
+                                    TIFFTAG_SMAXSAMPLEVALUE};
 
 std::uint64_t DivideUp(std::uint64_t nSize, std::uint64_t nPart)
 {
@@ -176,6 +178,36 @@ std::uint64_t PageModel::CountStriles() const
         nRows = moTags.GetNumber(TIFFTAG_TILELENGTH, 0);
     }
     return nAcross * DivideUp(nHeight, std::max<std::uint64_t>(1, nRows)) * (bSeparate ? nChannels : 1);
+}
+
+// A number too large for its product is left to whoever checks the form.
+StrileShape PageModel::GetShape() const
+{
+    const std::uint64_t nHeight = moTags.GetNumber(TIFFTAG_IMAGELENGTH, 0);
+    const bool bSeparate = moTags.GetNumber(TIFFTAG_PLANARCONFIG, PLANARCONFIG_CONTIG) == PLANARCONFIG_SEPARATE;
+    StrileShape oShape{CountStriles(), false, 0};
+    oShape.mbOnlyStrips = !IsTiled() && moTags.GetNumber(TIFFTAG_ROWSPERSTRIP, UINT32_MAX) >= nHeight &&
+                          oShape.mnCount <= StrileShape::MOST_ONLY_STRIPS;
+    if (!oShape.mbOnlyStrips || moTags.GetNumber(TIFFTAG_COMPRESSION, COMPRESSION_NONE) != COMPRESSION_NONE)
+        return oShape;
+    std::uint64_t nBits = moTags.GetNumber(TIFFTAG_BITSPERSAMPLE, 1);
+    const bool bTooLong =
+        __builtin_mul_overflow(nBits, bSeparate ? 1 : moTags.GetNumber(TIFFTAG_SAMPLESPERPIXEL, 1), &nBits) ||
+        __builtin_mul_overflow(nBits, moTags.GetNumber(TIFFTAG_IMAGEWIDTH, 0), &nBits) ||
+        __builtin_mul_overflow(nBits / 8 + (nBits % 8 != 0 ? 1 : 0), nHeight, &oShape.mnPlainBytes);
+    oShape.mnPlainBytes = bTooLong ? UINT64_MAX : oShape.mnPlainBytes;
+    return oShape;
+}
+
+bool PageModel::HasRanges() const
+{
+    return std::any_of(std::begin(RANGES), std::end(RANGES), [this](std::uint16_t nTag) { return moTags.Find(nTag); });
+}
+
+void PageModel::DropRanges()
+{
+    for (const std::uint16_t nTag : RANGES)
+        moTags.Remove(nTag);
 }
 
 PageSummary PageModel::Summarise() const

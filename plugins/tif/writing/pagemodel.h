@@ -32,6 +32,10 @@ public:
     bool IsChanged() const { return moTags.IsChanged() || mbStrilesChanged || moDirectory.mnBytes == 0; }
     // Strips or tiles that the tags call for.
     std::uint64_t CountStriles() const;
+    StrileShape GetShape() const;
+    // The tags of the smallest and largest sample.
+    bool HasRanges() const;
+    void DropRanges();
 
     std::uint64_t mnNumber = 0; // stays with the page
     TagList moTags;

@@ -145,6 +145,7 @@ void PageWriter::WriteInPlace(const Strile& oStrile, const support::PixelRect& o
                               std::size_t nPitch)
 {
     const std::size_t nStoredPitch = moForm.GetStoredRowBytes(moForm.mnStrileWidth);
+    mpoPage->GetStriles().Get(oStrile.mnNumber); // throws when nobody knows what it holds
     const std::uint64_t nOffset =
         mpoEditor->OwnStrile(*mpoModel, oStrile.mnNumber, nStoredPitch * oStrile.mnStoredRows);
     mpoEditor->GetFile()->WriteRows(nOffset + (oPart.mnY - oStrile.moRect.mnY) * nStoredPitch +
@@ -213,7 +214,7 @@ PageWriter::Held& PageWriter::Hold(const Strile& oStrile)
     while (!moHeld.empty() && mnHeldBytes + nBytes > mnBound)
         StoreOldest();
     Held oHeld{oStrile, std::vector<unsigned char>(nBytes)};
-    if (mpoModel->moByteCounts[oStrile.mnNumber] != 0)
+    if (mpoModel->Get(oStrile.mnNumber).IsStored())
         ReadStored(oStrile, oHeld.moPixels.data(), nPitch);
     moHeld.push_front(std::move(oHeld));
     moIndex[oStrile.mnNumber] = moHeld.begin();

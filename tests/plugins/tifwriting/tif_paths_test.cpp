@@ -3,6 +3,7 @@
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/pct/pct.h"
 #include "gobs/raster/rasterinfo.h"
+#include "plugins/tif/rawdirectory.h"
 #include "tests/plugins/tif/tifsupport.h"
 #include "tests/support/tiffwriter.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -34,6 +35,8 @@ struct ForeignFile
     std::uint16_t mnPredictor;
     bool mbTiled;
     bool mbSeparate;
+    std::uint16_t mnFormat = SAMPLEFORMAT_UINT;
+    std::uint16_t mnFillOrder = FILLORDER_MSB2LSB;
 
     TiffForm GetForm() const
     {
@@ -41,6 +44,7 @@ struct ForeignFile
                 .mnHeight = HEIGHT,
                 .mnChannels = mnChannels,
                 .mnBits = mnBits,
+                .mnFormat = mnFormat,
                 .mnCompression = mnCompression,
                 .mnPredictor = mnPredictor,
                 .mbSeparate = mbSeparate,
@@ -51,10 +55,21 @@ struct ForeignFile
 TEST(TifPaths, FilesOfOtherProgramsAreUpdatedInTheirOwnForm)
 {
     constexpr ForeignFile FILES[] = {
-        {"wb", 3, 16, COMPRESSION_NONE, 1, true, false},           {"wb", 2, 16, COMPRESSION_LZW, 2, false, false},
-        {"wb8", 1, 32, COMPRESSION_ADOBE_DEFLATE, 2, true, false}, {"wb", 3, 16, COMPRESSION_PACKBITS, 1, false, true},
-        {"wl", 1, 4, COMPRESSION_NONE, 1, false, false},           {"wb", 3, 2, COMPRESSION_LZW, 1, true, false},
-        {"wl", 1, 12, COMPRESSION_ADOBE_DEFLATE, 1, false, false}, {"wl", 2, 1, COMPRESSION_PACKBITS, 1, false, true}};
+        {"wb", 3, 16, COMPRESSION_NONE, 1, true, false},
+        {"wb", 2, 16, COMPRESSION_LZW, 2, false, false},
+        {"wb8", 1, 32, COMPRESSION_ADOBE_DEFLATE, 2, true, false},
+        {"wb", 3, 16, COMPRESSION_PACKBITS, 1, false, true},
+        {"wl", 1, 4, COMPRESSION_NONE, 1, false, false},
+        {"wb", 3, 2, COMPRESSION_LZW, 1, true, false},
+        {"wl", 1, 12, COMPRESSION_ADOBE_DEFLATE, 1, false, false},
+        {"wl", 2, 1, COMPRESSION_PACKBITS, 1, false, true},
+        {"wb", 2, 32, COMPRESSION_PACKBITS, 1, true, false, SAMPLEFORMAT_COMPLEXINT},
+        {"wb", 1, 64, COMPRESSION_LZMA, 1, true, false, SAMPLEFORMAT_COMPLEXIEEEFP},
+        {"wb", 1, 128, COMPRESSION_PACKBITS, 1, false, false, SAMPLEFORMAT_COMPLEXIEEEFP},
+        {"wb", 1, 32, COMPRESSION_LZW, 1, false, false, SAMPLEFORMAT_COMPLEXINT},
+        {"wl", 1, 16, COMPRESSION_NONE, 1, false, false, SAMPLEFORMAT_UINT, FILLORDER_LSB2MSB},
+        {"wl", 3, 8, COMPRESSION_LZW, 2, true, false, SAMPLEFORMAT_UINT, FILLORDER_LSB2MSB},
+        {"wb", 1, 1, COMPRESSION_PACKBITS, 1, true, false, SAMPLEFORMAT_UINT, FILLORDER_LSB2MSB}};
     const TempFolder oFolder;
     const std::string fileName = oFolder.File("foreign.tif");
     for (const ForeignFile& oForm : FILES)
@@ -64,6 +79,7 @@ TEST(TifPaths, FilesOfOtherProgramsAreUpdatedInTheirOwnForm)
         {
             const TiffFile poTiff = NewTiff(fileName, oForm.mpMode);
             SetForm(poTiff.get(), oForm.GetForm());
+            TIFFSetField(poTiff.get(), TIFFTAG_FILLORDER, oForm.mnFillOrder);
             WriteBlocks(poTiff.get());
         }
         TifPointer poDataset = OpenTif(fileName, eUpdate);
@@ -91,6 +107,81 @@ TEST(TifPaths, FilesOfOtherProgramsAreUpdatedInTheirOwnForm)
         {
             EXPECT_TRUE(oJudgement.moPixels == oExpected);
         }
+    }
+}
+
+// Takes the number of bytes of a strip or tile out of the first directory.
+void ForgetBytes(const std::string& fileName, std::size_t nStrile)
+{
+    using namespace krv::plugins;
+    support::File oFile(fileName, support::File::Mode::eUpdate);
+    tif::PeekReader oReader(oFile);
+    unsigned char aHeader[16] = {};
+    oFile.ReadUpTo(0, aHeader, sizeof(aHeader));
+    const auto oHeader = tif::FileHeader::Parse(aHeader, sizeof(aHeader));
+    const tif::RawDirectory oDirectory(oReader, *oHeader, oHeader->mnFirstDirectory);
+    for (const std::uint16_t nTag : {TIFFTAG_STRIPBYTECOUNTS, TIFFTAG_TILEBYTECOUNTS})
+        if (const tif::DirectoryEntry* const pEntry = oDirectory.Find(nTag))
+            oFile.Write(pEntry->mnOffset + nStrile * tif::GetTypeBytes(pEntry->mnType),
+                        reinterpret_cast<const unsigned char*>("\0\0\0\0\0\0\0"), tif::GetTypeBytes(pEntry->mnType));
+}
+
+// A single strip reaches to what follows it in the file, for who reads it and for who changes a pixel of it. What any
+// other strip or tile holds nobody knows until all of it is written.
+TEST(TifPaths, AStripWithAPlaceAndNoBytesIsNotTakenForMissing)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("none.tif");
+    struct Case
+    {
+        const char* mpOptions;
+        std::size_t mnStrile;
+        bool mbKnown;
+        unsigned int mnX, mnY, mnWidth, mnHeight; // of the strip or tile
+    };
+    constexpr Case CASES[] = {{"TILED=NO BLOCKYSIZE=3000", 0, true, 0, 0, 3000, 3000}, // changed in its place
+                              {"TILED=NO BLOCKYSIZE=60", 0, true, 0, 0, 50, 60},
+                              {"TILED=NO BLOCKYSIZE=60 COMPRESS=DEFLATE", 0, true, 0, 0, 50, 60},
+                              {"TILED=NO BLOCKYSIZE=60 COMPRESS=LZW", 0, true, 0, 0, 50, 60},
+                              {"TILED=NO BLOCKYSIZE=60 COMPRESS=PACKBITS", 0, true, 0, 0, 50, 60},
+                              {"TILED=NO BLOCKYSIZE=60 COMPRESS=ZSTD BIGTIFF=YES", 0, true, 0, 0, 50, 60},
+                              {"TILED=NO BLOCKYSIZE=2900", 1, false, 0, 2900, 3000, 100},
+                              {"TILED=NO BLOCKYSIZE=20 COMPRESS=DEFLATE", 1, false, 0, 20, 50, 20},
+                              {"BLOCKXSIZE=16 BLOCKYSIZE=16 COMPRESS=PACKBITS", 6, false, 32, 16, 16, 16}};
+    for (const Case& oCase : CASES)
+    {
+        SCOPED_TRACE(oCase.mpOptions);
+        const unsigned int nWidth = oCase.mnWidth > 50 ? 3000 : 50, nHeight = oCase.mnWidth > 50 ? 3000 : 60;
+        Bytes oPixels = MakePixels(nWidth, nHeight, 1, krv::gobs::eDT_8U, 5);
+        TifPointer poDataset = CreateTif(fileName, oCase.mpOptions, nWidth, nHeight, 1, krv::gobs::eDT_8U);
+        WriteAll(*poDataset, oPixels);
+        poDataset->Close();
+        ForgetBytes(fileName, oCase.mnStrile);
+        poDataset = OpenTif(fileName, eUpdate);
+        IOPointer poIO(poDataset->GetRasterIO({1}));
+        Bytes oBlock(std::size_t{oCase.mnWidth} * oCase.mnHeight, 77);
+        const auto Write = [&](unsigned int nColumns, unsigned int nRows)
+        {
+            poIO->WriteWindow(oCase.mnX, oCase.mnY, nColumns, nRows, oBlock.data());
+        };
+        if (oCase.mbKnown)
+        {
+            EXPECT_TRUE(ReadAll(*OpenTif(fileName)) == oPixels);
+            Write(1, 1);
+            oPixels[0] = 77;
+        }
+        else
+        {
+            EXPECT_THROW(ReadAll(*OpenTif(fileName)), krv::FileFormatException);
+            EXPECT_THROW(Write(1, 1), krv::FileFormatException);
+            Write(oCase.mnWidth, oCase.mnHeight);
+            for (unsigned int nRow = 0; nRow < oCase.mnHeight; ++nRow)
+                std::memset(&oPixels[(oCase.mnY + nRow) * nWidth + oCase.mnX], 77, oCase.mnWidth);
+        }
+        poIO.reset();
+        poDataset->Close();
+        EXPECT_TRUE(ReadAll(*OpenTif(fileName)) == oPixels);
+        EXPECT_TRUE(Judge(fileName).moPixels == oPixels);
     }
 }
 
@@ -163,6 +254,32 @@ TEST(TifPaths, PagesBelowTheFirstAndTagsThatNobodyAskedAboutStay)
     toff_t* pBelow = nullptr;
     ASSERT_EQ(TIFFGetField(poAgain.get(), TIFFTAG_SUBIFD, &nBelow, &pBelow), 1);
     EXPECT_EQ(TIFFSetSubDirectory(poAgain.get(), *pBelow), 1);
+}
+
+// Those that are given to a new file are of the pixels to come.
+TEST(TifPaths, StatisticsGoWithThePixelsThatTheyAreOf)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("s.tif");
+    TifPointer poDataset = CreateTif(fileName, "", 40, 30, 2, krv::gobs::eDT_8U);
+    AuxiliaryData oData(2);
+    oData.SetFileMetadata({{"Histogram_1", "1 2"}, {"Scale", "2"}});
+    oData.SetChanMetadata({{"Statistics_Mean", "5"}, {"Offset", "1"}}, 2);
+    AuxiliaryData oLess(2);
+    oLess.SetFileMetadata({{"Scale", "2"}});
+    oLess.SetChanMetadata({{"Offset", "1"}}, 2);
+    poDataset->WriteAuxiliaryData(oData);
+    const auto WriteAndRead = [&]
+    {
+        WriteAll(*poDataset, Bytes(40 * 30 * 2, 9));
+        poDataset->Synchronize();
+        AuxiliaryData oRead = poDataset->ReadAuxiliaryData();
+        return std::pair(oRead.GetFileMetadata(), oRead.GetChanMetadata(2));
+    };
+    EXPECT_EQ(WriteAndRead(), std::pair(oData.GetFileMetadata(), oData.GetChanMetadata(2)));
+    EXPECT_EQ(WriteAndRead(), std::pair(oLess.GetFileMetadata(), oLess.GetChanMetadata(2)));
+    poDataset->WriteAuxiliaryData(oData);
+    EXPECT_EQ(WriteAndRead(), std::pair(oLess.GetFileMetadata(), oLess.GetChanMetadata(2))) << "of the pixels before";
 }
 
 TEST(TifPaths, ColourTablesAreStoredChangedAndDeleted)

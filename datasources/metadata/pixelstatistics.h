@@ -1,0 +1,14 @@
+#pragma once
+
+#include "datasources/api.h"
+#include "datasources/metadata/auxiliarydata.h"
+
+namespace krv::datasources
+{
+
+// Take what a record says of the values of pixels out of it, which no longer holds when pixels change: the keys that
+// begin with "STATISTICS_" or "Histogram_", and "LAYER_CRC", in any letter case. True when there was any.
+KRV_DATASOURCES_API bool DropStatistics(MetadataMap& oMap);
+KRV_DATASOURCES_API bool DropStatistics(AuxiliaryData& oRecord);
+
+} // namespace krv::datasources
