@@ -15,6 +15,11 @@
 #include <algorithm>
 #include <cstring>
 #include <filesystem>
+#include <fstream>
+
+#include <sys/resource.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
 namespace
 {
@@ -352,6 +357,88 @@ TEST(TifPaths, JpegIsWrittenAndUpdatedWithinItsLoss)
         EXPECT_LT(nSum / static_cast<double>(oPixels.size()), 3.0);
     }
 }
+
+// A tile with tables of its own among others that go by the page's, as careless writers leave them, and colours sampled
+// alike in both directions.
+TEST(TifPaths, JpegTilesReadTheSameInAnyOrderAndAreWrittenInTheFormOfTheirPage)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("shared.tif");
+    const auto Open = [](const std::string& name, int nTables, int nQuality)
+    {
+        TiffFile poTiff = NewTiff(name);
+        SetForm(poTiff.get(), {.mnWidth = 64,
+                               .mnHeight = 16,
+                               .mnChannels = 3,
+                               .mnCompression = COMPRESSION_JPEG,
+                               .mnPhotometric = PHOTOMETRIC_YCBCR,
+                               .mnTileWidth = 16});
+        TIFFSetField(poTiff.get(), TIFFTAG_YCBCRSUBSAMPLING, 1, 1);
+        TIFFSetField(poTiff.get(), TIFFTAG_JPEGTABLESMODE, nTables);
+        TIFFSetField(poTiff.get(), TIFFTAG_JPEGQUALITY, nQuality);
+        TIFFSetField(poTiff.get(), TIFFTAG_JPEGCOLORMODE, JPEGCOLORMODE_RGB);
+        WriteBlocks(poTiff.get());
+        return poTiff;
+    };
+    Open(oFolder.File("own.tif"), 0, 98).reset();
+    {
+        const TiffFile poOwn(TIFFOpen(oFolder.File("own.tif").c_str(), "r"));
+        Bytes oRaw(TIFFGetStrileByteCount(poOwn.get(), 0));
+        TIFFReadRawTile(poOwn.get(), 0, oRaw.data(), static_cast<tmsize_t>(oRaw.size()));
+        const TiffFile poTiff = Open(fileName, JPEGTABLESMODE_QUANT | JPEGTABLESMODE_HUFF, 30);
+        ASSERT_GT(TIFFWriteRawTile(poTiff.get(), 0, oRaw.data(), static_cast<tmsize_t>(oRaw.size())), 0);
+    }
+    const auto ReadTile = [](const TifPointer& poDataset, unsigned int nTile)
+    {
+        Bytes oTile(16 * 16 * 3);
+        IOPointer(poDataset->GetRasterIO({1, 2, 3}))->ReadWindow(16 * nTile, 0U, 16U, 16U, oTile.data());
+        return oTile;
+    };
+    const TifPointer poInOrder = OpenTif(fileName);
+    for (unsigned int nTile = 0; nTile < 4; ++nTile)
+        EXPECT_TRUE(ReadTile(poInOrder, nTile) == ReadTile(OpenTif(fileName), nTile)) << nTile;
+    const TifPointer poDataset = OpenTif(fileName, eUpdate);
+    IOPointer(poDataset->GetRasterIO({1, 2, 3}))->WriteWindow(0U, 0U, 32U, 16U, Bytes(32 * 16 * 3, 200).data());
+    poDataset->Close();
+    const TifPointer poAgain = OpenTif(fileName);
+    for (unsigned int nTile = 0; nTile < 2; ++nTile)
+        EXPECT_THAT(ReadTile(poAgain, nTile), testing::Each(testing::AllOf(testing::Ge(190), testing::Le(210))));
+    for (unsigned int nTile = 2; nTile < 4; ++nTile)
+        EXPECT_TRUE(ReadTile(poAgain, nTile) == ReadTile(poInOrder, nTile)) << nTile;
+}
+
+#ifndef __SANITIZE_ADDRESS__
+// Level 9 alone would ask for a dictionary of 64 MiB, and eleven times that beside it.
+TEST(TifPaths, LzmaTakesMemoryByTheBlock)
+{
+    const TempFolder oFolder;
+    const pid_t nChild = ::fork();
+    if (nChild == 0)
+    {
+        std::ifstream oStream("/proc/self/statm");
+        std::size_t nPages = 0;
+        oStream >> nPages;
+        const rlim_t nMost = (nPages << 12U) + (rlim_t{256} << 20U);
+        const rlimit oLimit{nMost, nMost};
+        ::setrlimit(RLIMIT_AS, &oLimit);
+        try
+        {
+            const TifPointer poDataset =
+                CreateTif(oFolder.File("l.tif"), "COMPRESS=LZMA LEVEL=9", 100, 100, 1, krv::gobs::eDT_8U);
+            WriteAll(*poDataset, Bytes(100 * 100, 3));
+            poDataset->Close();
+            ::_exit(0);
+        }
+        catch (const std::exception&)
+        {
+            ::_exit(1);
+        }
+    }
+    int nStatus = 0;
+    ::waitpid(nChild, &nStatus, 0);
+    EXPECT_EQ(nStatus, 0);
+}
+#endif
 
 // Directories and their values stand before all blocks, from the image to the smallest level; blocks the other way.
 TEST(TifPaths, ACloudOptimisedFileIsInItsOrder)
