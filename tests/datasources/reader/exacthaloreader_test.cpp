@@ -17,8 +17,13 @@ class ExactHaloReaderTest : public ReaderTest
 
 } // namespace
 
-TEST_F(ExactHaloReaderTest, RefusalsSayWhy)
+TEST_F(ExactHaloReaderTest, OwnsWhatItTookAndRefusalsSayWhy)
 {
+    {
+        const ExactHaloReader oOwner(new BasicReader(moFile), true);
+        EXPECT_GT(moProbe.GetLive(), 0);
+    }
+    EXPECT_EQ(moProbe.GetLive(), 0);
     ExactHaloReader oReader(new BasicReader(moFile, Channels{1, 2, 3}), true);
     const auto Read = [&](eMarginBehaviour eBehaviour)
     {

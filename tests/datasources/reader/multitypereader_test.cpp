@@ -60,7 +60,8 @@ TEST_F(MultiTypeReaderTest, RefusalsSayWhatIsWrong)
     EXPECT_EQ(Error([&] { oReader.ReadRaster(&oOther); }),
               "data: The data type in the requested Rasterdoesn't match the data type of this Reader.");
     // A refused margin leaves all groups in step.
-    EXPECT_NE(Error([&] { oReader.SetMargins(50, 50, eMirror); }), "");
+    EXPECT_NE(Error([&] { oReader.SetMargins(50, 50, eWrap); }), "");
+    EXPECT_EQ(oReader.GetMarginBehaviour(), eWrap); // stored even when all refuse, as by one reader
     const RasterPtr oRaster(oReader.GetRaster(0));
     EXPECT_EQ(oRaster->GetXMargin(), 0u);
     moMakeDataset = [this]() -> std::unique_ptr<krv::datasources::IDataset>
