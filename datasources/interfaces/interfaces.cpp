@@ -10,6 +10,7 @@
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
 #include "datasources/interfaces/imathmodeldataset.h"
+#include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/interfaces/ioverviewio.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/ipageddataset.h"
@@ -31,6 +32,7 @@ IFileIOBuilder::~IFileIOBuilder() = default;
 IGeocodedDataset::~IGeocodedDataset() = default;
 IHistoryIO::~IHistoryIO() = default;
 IMathModelDataset::~IMathModelDataset() = default;
+INewFileDataset::~INewFileDataset() = default;
 IOverviewIO::~IOverviewIO() = default;
 IOverviewManager::~IOverviewManager() = default;
 IPCTDataset::~IPCTDataset() = default;

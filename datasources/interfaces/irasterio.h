@@ -33,7 +33,8 @@ public:
     virtual void ReadWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
                             unsigned char* pBuffer) = 0;
 
-    // The counterparts: they store the part of the buffer that lies inside the image, and the whole window.
+    // The counterparts: they store the part of the buffer, and the whole window. What is stored lies inside the image,
+    // else krv::DataException before anything is: nothing of it would be found again.
     virtual void WriteWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
                              unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
                              unsigned char* const pBuffer) = 0;

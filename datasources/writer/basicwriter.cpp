@@ -6,6 +6,7 @@
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/interfaces/ioverviewio.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/iomanager/datasetmanager.h"
@@ -72,15 +73,14 @@ BasicWriter::BasicWriter(const std::string& fileName, const std::vector<unsigned
     if (oChannels.empty())
         throw krv::DataException("No channels in dataset: file=" + fileName, oPlace);
     DatasetManager& oManager = *DatasetManager::GetInstance();
-    mpoChannels->mbOwnsDataset = true;
-    mpoChannels->mpoDataset = krv::core::fileio::File(fileName).Exists()
-                                  ? oManager.Open(fileName, eUpdate)
-                                  : oManager.NewDataset(fileName, format, options);
-    if (mpoChannels->mpoDataset == nullptr)
-        throw krv::DataException("Unrecognized format: file=" + fileName, oPlace);
-    RequireFacet<IRasterDataset>(mpoChannels->mpoDataset, "Format does not support rasters: file=" + fileName, oPlace);
-    mpoChannels->moChannels = oChannels;
-    if (mpoChannels->mpoDataset->Exists())
+    const bool bThere = krv::core::fileio::File(fileName).Exists();
+    IDataset& oDataset =
+        UseNamed(bThere ? oManager.Open(fileName, eUpdate) : oManager.NewDataset(fileName, format, options), fileName,
+                 oChannels, oPlace);
+    auto* const poNewFile = dynamic_cast<INewFileDataset*>(&oDataset);
+    if (!bThere && poNewFile != nullptr)
+        poNewFile->KeepExisting();
+    if (oDataset.Exists())
         OpenDatasetOrCleanup(false);
 }
 
@@ -129,6 +129,18 @@ BasicWriter::BasicWriter(IRasterDataset* poDataset, IRasterIO* poRasterIO, const
 }
 
 BasicWriter::~BasicWriter() = default;
+
+IDataset& BasicWriter::UseNamed(IDataset* poDataset, const std::string& fileName,
+                                const std::vector<unsigned int>& oChannels, const Place& oPlace)
+{
+    mpoChannels->mbOwnsDataset = true;
+    mpoChannels->mpoDataset = poDataset;
+    if (poDataset == nullptr)
+        throw krv::DataException("Unrecognized format: file=" + fileName, oPlace);
+    RequireFacet<IRasterDataset>(poDataset, "Format does not support rasters: file=" + fileName, oPlace);
+    mpoChannels->moChannels = oChannels;
+    return *poDataset;
+}
 
 // Opens a file whose image must be there already, and owns it from then on.
 IRasterDataset& BasicWriter::UseFile(const std::string& fileName, const char* pMissing, const Place& oPlace)

@@ -18,7 +18,8 @@ class IRasterIO;
 
 // Writes the selected channels or bitmaps of one dataset and reads them back. A writer on a new file knows neither size
 // nor type before CreateNewFile: it has no tiles, and whatever needs the image opens it on first use. Nothing is
-// buffered here. A failed opening leaves the writer as it was.
+// buffered here. A failed opening leaves the writer as it was. What was written is in the file after Synchronize, and
+// not before: a writer that goes without drops it, with a warning, and a new file is not there then.
 class KRV_DATASOURCES_API BasicWriter : public RasterAccess, public IRasterWriter
 {
 public:
@@ -26,7 +27,9 @@ public:
     explicit BasicWriter(const std::string& fileName);
     // Channels of an existing file, from 1; an empty list is all of them.
     BasicWriter(const std::string& fileName, const std::vector<unsigned int>& oChannels);
-    // Channels of an existing file, or of a new one in a format, whose image CreateNewFile lays out.
+    // Channels of an existing file, or of a new one in a format, whose image CreateNewFile lays out. A new file takes
+    // its name only when nobody took it meanwhile: CreateNewFile and Synchronize throw IOException then. For a file
+    // that replaces another as a whole see ReplacingWriter.
     BasicWriter(const std::string& fileName, const std::vector<unsigned int>& oChannels, const std::string& format,
                 const std::string& options);
     // The channels of an existing file that a filter accepts; a filter that accepts none selects all, intended.
@@ -69,6 +72,10 @@ protected:
     void FillMargins(krv::gobs::Raster* poRaster);
     // Opens a file for update; the caller owns the result, which is null when the file holds no image.
     static IRasterDataset* RDSIf(const std::string& fileName);
+
+    // Takes a dataset over, and the channels of its file. Throws DataException for null and for one without rasters.
+    IDataset& UseNamed(IDataset* poDataset, const std::string& fileName, const std::vector<unsigned int>& oChannels,
+                       const krv::Place& oPlace);
 
 private:
     void LazyOpen();

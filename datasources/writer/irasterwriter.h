@@ -12,7 +12,9 @@ namespace krv::datasources
 
 class IOverviewWriterAccessor;
 
-// Tile-oriented write access to some channels of an image, which reads what it wrote as well. One thread at a time.
+// Tile-oriented write access to some channels of an image, which reads what it wrote as well. What was written counts
+// from Synchronize on, which reports every failure: a writer that goes without it drops what came after the last one,
+// and a new file that never got that far. One thread at a time.
 // The order of the virtual operations is fixed.
 class KRV_DATASOURCES_API IRasterWriter : public virtual IRasterIterable, public virtual IRasterReader
 {
@@ -33,7 +35,8 @@ public:
     virtual void SetGeocodingInfo(const krv::ogc::cs::GeocodingInfo& oInfo) = 0;
     // A new object owned by the caller, or null for bitmaps and overview levels.
     virtual IOverviewWriterAccessor* GetOverviewWriterAccessor() = 0;
-    // Flushes the dataset; failures to write show here at the latest.
+    // Makes what was written the file's; failures to write show here at the latest. To be called before the writer
+    // goes.
     virtual void Synchronize() = 0;
 };
 

@@ -19,6 +19,8 @@ DemoDataset::DemoDataset(const std::string& fileName, krv::datasources::IFileFor
 // I/O objects may keep the file a little longer.
 DemoDataset::~DemoDataset()
 {
+    if (mpoFile != nullptr && mpoFile->IsChanged())
+        WarnOfLoss();
     if (mpoFile != nullptr)
         mpoFile->Discard();
 }
@@ -41,8 +43,9 @@ void DemoDataset::Create(unsigned int nWidth, unsigned int nHeight, const std::v
         if (oType.GetNativeCode() == krv::gobs::eDT_BIT)
             Refuse("channels of single bits cannot be stored");
     UseFile(std::make_shared<DemoFile>(
-        GetFileName(), DemoHeader{nWidth, nHeight, oTypes,
-                                  krv::datasources::AuxiliaryData(static_cast<unsigned int>(oTypes.size()))}));
+        GetFileName(),
+        DemoHeader{nWidth, nHeight, oTypes, krv::datasources::AuxiliaryData(static_cast<unsigned int>(oTypes.size()))},
+        Replaces()));
 }
 
 bool DemoDataset::Exists() const

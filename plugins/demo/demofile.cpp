@@ -15,14 +15,14 @@ DemoFile::DemoFile(const std::string& fileName)
     moHeader = DemoHeader::Parse(fileName, bytes, mnPixelOffset);
 }
 
-DemoFile::DemoFile(const std::string& fileName, DemoHeader oHeader)
+DemoFile::DemoFile(const std::string& fileName, DemoHeader oHeader, bool bReplace)
     : moHeader(std::move(oHeader)), mnPixelOffset(DemoHeader::MAX_BYTES), moFileName(fileName), mbWritable(true),
-      mbMarked(true)
+      mbReplace(bReplace), mbMarked(true)
 {
     std::string text = moHeader.ToText(fileName);
     const std::uint64_t nPixelBytes = moHeader.GetPixelBytes();
     text.replace(0, DemoHeader::UNFINISHED.size(), DemoHeader::UNFINISHED);
-    moTemporary = support::MakeTemporaryName(fileName);
+    moTemporary = support::MakeTemporaryName(fileName, bReplace);
     try
     {
         mpoFile = std::make_unique<support::File>(moTemporary, support::File::Mode::eCreate);
@@ -99,12 +99,11 @@ void DemoFile::Finish()
     mpoFile->Flush();
     mpoFile->Write(0, DemoHeader::SIGNATURE.data(), DemoHeader::SIGNATURE.size());
     mpoFile->Flush();
+    if (!moTemporary.empty())
+        mpoFile->Rename(moFileName, mbReplace);
+    moTemporary.clear();
     mbMarked = false;
     mbNewTags = false;
-    if (moTemporary.empty())
-        return;
-    mpoFile->Rename(moFileName);
-    moTemporary.clear();
 }
 
 } // namespace krv::plugins::demo

@@ -16,8 +16,8 @@ class DemoFile
 public:
     // Throws krv::FileFormatException when the header is not whole.
     explicit DemoFile(const std::string& fileName);
-    // Pixels that are never written are 0.
-    DemoFile(const std::string& fileName, DemoHeader oHeader);
+    // Pixels that are never written are 0. bReplace: takes the place of a file of the name.
+    DemoFile(const std::string& fileName, DemoHeader oHeader, bool bReplace);
     // As Discard.
     ~DemoFile();
     DemoFile(const DemoFile&) = delete;
@@ -27,6 +27,8 @@ public:
     bool IsWritable() const { return mbWritable; }
     // Whether the file has its own name.
     bool IsNamed() const { return moTemporary.empty(); }
+    // Whether something is not finished.
+    bool IsChanged() const { return mbWritable && (mbMarked || mbNewTags); }
     // Of the first pixel.
     std::uint64_t GetPixelOffset() const { return mnPixelOffset; }
     const support::File& GetFile() const { return *mpoFile; }
@@ -50,6 +52,7 @@ private:
     std::string moFileName;
     std::string moTemporary; // empty when the file has its own name
     bool mbWritable = false;
+    bool mbReplace = true;
     bool mbMarked = false;  // the file says that it is unfinished
     bool mbNewTags = false; // the header in the file is not moHeader
 };

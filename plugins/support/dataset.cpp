@@ -5,6 +5,7 @@
 #include "plugins/support/rasterio.h"
 #include "plugins/support/storedchannelinfo.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/warning.h"
 
 #include <cerrno>
 #include <cstdio>
@@ -46,6 +47,23 @@ void Dataset::SetImage(std::unique_ptr<IBlockSource> poSource)
 void Dataset::Refuse(const std::string& what, const Place& oPlace) const
 {
     throw DataException(moName + ": " + what, oPlace);
+}
+
+void Dataset::WarnOfLoss() const noexcept
+{
+    if (std::uncaught_exceptions() > mnExceptions)
+        return;
+    try
+    {
+        const Place oPlace = Place::Current();
+        krv::nspio::Warning::Warn(moName + ": the dataset goes without Synchronize or Close; what was written since "
+                                           "the last one is lost",
+                                  oPlace.GetSourceFile(), oPlace.GetLine());
+    }
+    catch (...)
+    {
+        // A sink that throws has been told.
+    }
 }
 
 void Dataset::CheckOpen(const Place& oPlace) const

@@ -1,11 +1,13 @@
 #pragma once
 
 #include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "plugins/support/blockcache.h"
 #include "plugins/support/blockimage.h"
 #include "plugins/support/iblocksource.h"
 
+#include <exception>
 #include <memory>
 #include <string>
 #include <vector>
@@ -16,7 +18,9 @@ namespace krv::plugins::support
 // A dataset of one file with one image, ready but for the image itself: a format derives from it, calls SetImage, and
 // overrides what it has more of. Writing, creating and changing are refused with a DataException that names the file
 // and the operation, there are no overviews, no history, no reference system and no metadata.
-class Dataset : public krv::datasources::IDataset, public krv::datasources::IRasterDataset
+class Dataset : public krv::datasources::IDataset,
+                public krv::datasources::IRasterDataset,
+                public krv::datasources::INewFileDataset
 {
 public:
     // poFormat: the builder's, kept as a pointer. Operations that need the image throw DataException until SetImage.
@@ -55,7 +59,14 @@ public:
     // Readable only.
     krv::datasources::AccessCapabilities GetRasterCapabilities() override;
 
+    void KeepExisting() override { mbReplaces = false; }
+
 protected:
+    // Whether a new file replaces one of its name.
+    bool Replaces() const { return mbReplaces; }
+    // For the destructor of a dataset that still has changes: warns that they are lost, unless an exception is on its
+    // way, which says more.
+    void WarnOfLoss() const noexcept;
     // Makes the source the dataset's image and bounds the cache: three rows of its blocks, at least 64 MiB, at most
     // 256.
     void SetImage(std::unique_ptr<IBlockSource> poSource);
@@ -75,6 +86,8 @@ private:
     std::shared_ptr<BlockCache> mpoCache;
     std::shared_ptr<BlockImage> mpoImage;
     bool mbOpen = true;
+    bool mbReplaces = true;
+    int mnExceptions = std::uncaught_exceptions();
 };
 
 } // namespace krv::plugins::support

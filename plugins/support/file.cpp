@@ -95,6 +95,39 @@ void CopyRows(const unsigned char* pSource, std::size_t nSourcePitch, unsigned c
         std::memcpy(pTarget + nRow * nTargetPitch, pSource + nRow * nSourcePitch, nRowBytes);
 }
 
+[[noreturn]] void ThrowTaken(const std::string& fileName, const Place& oPlace)
+{
+    throw IOException(fileName, fileName + ": there is a file of that name meanwhile, which is not replaced", oPlace);
+}
+
+bool IsUnknownCall(int nError)
+{
+    return nError == EINVAL || nError == ENOSYS || nError == EOPNOTSUPP || nError == EPERM;
+}
+
+// Renames to a name that nobody has; returns 0, or the error number.
+int RenameToFree(const char* pFrom, const char* pTo)
+{
+    if (::renameat2(AT_FDCWD, pFrom, AT_FDCWD, pTo, RENAME_NOREPLACE) == 0)
+        return 0;
+    if (!IsUnknownCall(errno))
+        return errno;
+    if (::link(pFrom, pTo) == 0)
+        return ::unlink(pFrom) == 0 ? 0 : errno;
+    if (!IsUnknownCall(errno))
+        return errno;
+    // Without either of them an empty file takes the name first.
+    const int nTaken = ::open(pTo, O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0666);
+    if (nTaken < 0)
+        return errno;
+    ::close(nTaken);
+    if (std::rename(pFrom, pTo) == 0)
+        return 0;
+    const int nError = errno;
+    ::unlink(pTo);
+    return nError;
+}
+
 } // namespace
 
 std::string SystemErrorText(int nError)
@@ -103,13 +136,15 @@ std::string SystemErrorText(int nError)
     return strerror_r(nError, aText, sizeof(aText));
 }
 
-std::string MakeTemporaryName(const std::string& fileName, const Place& oPlace)
+std::string MakeTemporaryName(const std::string& fileName, bool bReplace, const Place& oPlace)
 {
     struct stat oStatus = {};
     if (fileName.empty() || fileName.back() == '/')
         throw IOException(fileName, "\"" + fileName + "\": a new file has a name", oPlace);
     if (::stat(fileName.c_str(), &oStatus) == 0 && !S_ISREG(oStatus.st_mode))
         throw IOException(fileName, fileName + ": is not a plain file and is not replaced", oPlace);
+    if (!bReplace && ::lstat(fileName.c_str(), &oStatus) == 0)
+        ThrowTaken(fileName, oPlace);
     if (::access(fileName.c_str(), W_OK) != 0 && errno != ENOENT && errno != ENOTDIR)
         throw IOException(fileName, fileName + ": cannot be replaced: " + SystemErrorText(errno), oPlace);
     const std::size_t nSlash = fileName.rfind('/');
@@ -301,14 +336,21 @@ void File::EndWriting() noexcept
 }
 
 // The folder is flushed as well as the system lets it: not every file system has that.
-void File::Rename(const std::string& fileName, const Place& oPlace)
+void File::Rename(const std::string& fileName, bool bReplace, const Place& oPlace)
 {
     // Who may read and write a file does not change with what it holds.
     struct stat oStatus = {};
-    if (::stat(fileName.c_str(), &oStatus) == 0)
+    if (bReplace && ::stat(fileName.c_str(), &oStatus) == 0)
         ::fchmod(mnDescriptor, oStatus.st_mode & 07777);
-    if (std::rename(moPath.c_str(), fileName.c_str()) != 0)
-        throw IOException(fileName, fileName + ": cannot be put in its place: " + SystemErrorText(errno), oPlace);
+    int nError = 0;
+    if (!bReplace)
+        nError = RenameToFree(moPath.c_str(), fileName.c_str());
+    else if (std::rename(moPath.c_str(), fileName.c_str()) != 0)
+        nError = errno;
+    if (nError == EEXIST && !bReplace)
+        ThrowTaken(fileName, oPlace);
+    if (nError != 0)
+        throw IOException(fileName, fileName + ": cannot be put in its place: " + SystemErrorText(nError), oPlace);
     moPath = fileName;
     moName = fileName;
     const std::size_t nSlash = fileName.rfind('/');

@@ -80,9 +80,9 @@ public:
     // From now on messages, and GetName, name the file otherwise.
     void ShowAs(const std::string& fileName) { moName = fileName; }
 
-    // Gives the file another name in the same file system, replacing a file of that name, whose permissions it takes
-    // over, and makes sure that the name reaches the disk.
-    void Rename(const std::string& fileName, const Place& oPlace = Place::Current());
+    // Gives the file another name in the same file system and makes sure that it reaches the disk. A file of that name
+    // is replaced, and its permissions are taken over; unless bReplace is set it stays, and IOException says so.
+    void Rename(const std::string& fileName, bool bReplace, const Place& oPlace = Place::Current());
 
 private:
     bool CanSeeLocks() const;
@@ -114,8 +114,8 @@ void HoldRoot(File& oFile, ReadRoot oReadRoot)
 // A name for what becomes fileName when it is whole: in the same folder, so that it can be renamed, of no length that a
 // folder does not take, and of this process alone. Throws FileNotFoundException when there is no such folder, and
 // IOException when the folder must not be written, when a folder, a device or the like has the name, or a file that
-// must not be written: renaming would put the file in its place.
-std::string MakeTemporaryName(const std::string& fileName, const Place& oPlace = Place::Current());
+// must not be written: renaming would put the file in its place. So does any file when bReplace is not set.
+std::string MakeTemporaryName(const std::string& fileName, bool bReplace, const Place& oPlace = Place::Current());
 
 // The text of an error number, in the C locale.
 std::string SystemErrorText(int nError);

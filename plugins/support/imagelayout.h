@@ -5,6 +5,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <source_location>
 #include <vector>
 
 namespace krv::plugins::support
@@ -31,6 +32,10 @@ struct PixelRect
 
     friend bool operator==(const PixelRect&, const PixelRect&) = default;
 };
+
+// Throws DataException when a window does not lie inside an image. Positions may be negative.
+void CheckInside(std::int64_t nX, std::int64_t nY, unsigned int nWidth, unsigned int nHeight, unsigned int nImageWidth,
+                 unsigned int nImageHeight, const std::source_location& oLocation);
 
 // Where a channel lies: its plane, and its position among the plane's channels, both from 0.
 struct ChannelPlace

@@ -50,7 +50,7 @@ std::size_t GetPitch(const ChannelSelection& oChannels, unsigned int nWidth, uns
     return static_cast<std::size_t>(nPitch);
 }
 
-// The long form: part and image are intersected.
+// The long form: part and image are intersected. What is written is held against the image besides.
 Transfer Clip(const ImageLayout& oLayout, const ChannelSelection& oChannels, int nX, int nY, const PixelRect& oPart,
               unsigned int nWidth, unsigned int nHeight, const Location& oLocation)
 {
@@ -80,12 +80,8 @@ Transfer Clip(const ImageLayout& oLayout, const ChannelSelection& oChannels, int
 Transfer Inside(const ImageLayout& oLayout, const ChannelSelection& oChannels, const PixelRect& oWindow,
                 const Location& oLocation)
 {
-    if (std::uint64_t{oWindow.mnX} + oWindow.mnWidth > oLayout.GetWidth() ||
-        std::uint64_t{oWindow.mnY} + oWindow.mnHeight > oLayout.GetHeight())
-        throw DataException("The window " + Text(oWindow.mnX, oWindow.mnY, oWindow.mnWidth, oWindow.mnHeight) +
-                                " is not inside the image of " + std::to_string(oLayout.GetWidth()) + " x " +
-                                std::to_string(oLayout.GetHeight()),
-                            Place::Current(oLocation));
+    CheckInside(oWindow.mnX, oWindow.mnY, oWindow.mnWidth, oWindow.mnHeight, oLayout.GetWidth(), oLayout.GetHeight(),
+                oLocation);
     Transfer oTransfer;
     oTransfer.mnPitch = GetPitch(oChannels, oWindow.mnWidth, oWindow.mnHeight, oLocation);
     if (oWindow.mnHeight != 0)
@@ -169,6 +165,8 @@ void BlockRasterIO<Base>::WriteWindow(int nX, int nY, unsigned int nWidth, unsig
     CheckBuffer(pBuffer, Location::current());
     const Transfer oTransfer = Clip(mpoImage->GetLayout(), moChannels, nX, nY,
                                     {nPartX, nPartY, nPartWidth, nPartHeight}, nWidth, nHeight, Location::current());
+    CheckInside(std::int64_t{nX} + nPartX, std::int64_t{nY} + nPartY, nPartWidth, nPartHeight, GetFileWidth(),
+                GetFileHeight(), Location::current());
     if (oTransfer.moRect.mnWidth != 0)
         mpoImage->Write(moChannels, oTransfer.moRect, pBuffer + oTransfer.mnBegin, oTransfer.mnPitch);
 }

@@ -73,12 +73,6 @@ void StackedIO::ForEachSlice(int nX, int nY, unsigned int nWidth, unsigned int n
     }
 }
 
-void StackedIO::CheckInside(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight) const
-{
-    if (std::uint64_t{nX} + nWidth > GetFileWidth() || std::uint64_t{nY} + nHeight > GetFileHeight())
-        throw DataException("The window is not inside the image");
-}
-
 void StackedIO::ReadWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
                            unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
                            unsigned char* pBuffer)
@@ -98,7 +92,7 @@ void StackedIO::ReadWindow(int nX, int nY, unsigned int nWidth, unsigned int nHe
 void StackedIO::ReadWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
                            unsigned char* pBuffer)
 {
-    CheckInside(nX, nY, nWidth, nHeight);
+    CheckInside(nX, nY, nWidth, nHeight, GetFileWidth(), GetFileHeight(), std::source_location::current());
     ReadWindow(static_cast<int>(nX), static_cast<int>(nY), nWidth, nHeight, 0, 0, nWidth, nHeight, pBuffer);
 }
 
@@ -108,6 +102,8 @@ void StackedIO::WriteWindow(int nX, int nY, unsigned int nWidth, unsigned int nH
 {
     if (moParts.size() == 1)
         return moParts.front()->WriteWindow(nX, nY, nWidth, nHeight, nPartX, nPartY, nPartWidth, nPartHeight, pBuffer);
+    CheckInside(std::int64_t{nX} + nPartX, std::int64_t{nY} + nPartY, nPartWidth, nPartHeight, GetFileWidth(),
+                GetFileHeight(), std::source_location::current());
     ForEachSlice(nX, nY, nWidth, nHeight, {nPartX, nPartY, nPartWidth, nPartHeight}, pBuffer,
                  [&](std::size_t nAt, const PixelRect& oRect, unsigned char* pPlane, std::size_t nPlanePitch,
                      std::size_t nBegin, std::size_t nPitch)
@@ -121,7 +117,7 @@ void StackedIO::WriteWindow(int nX, int nY, unsigned int nWidth, unsigned int nH
 void StackedIO::WriteWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
                             unsigned char* const pBuffer)
 {
-    CheckInside(nX, nY, nWidth, nHeight);
+    CheckInside(nX, nY, nWidth, nHeight, GetFileWidth(), GetFileHeight(), std::source_location::current());
     WriteWindow(static_cast<int>(nX), static_cast<int>(nY), nWidth, nHeight, 0, 0, nWidth, nHeight, pBuffer);
 }
 

@@ -40,7 +40,6 @@ private:
     template <typename Action>
     void ForEachSlice(int nX, int nY, unsigned int nWidth, unsigned int nHeight, const PixelRect& oPart,
                       const unsigned char* pBuffer, Action oAction);
-    void CheckInside(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight) const;
 
     std::vector<std::unique_ptr<krv::datasources::IRasterIO>> moParts;
     unsigned int mnValueBytes;

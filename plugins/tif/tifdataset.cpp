@@ -103,6 +103,8 @@ TifDataset::TifDataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<
 
 TifDataset::~TifDataset()
 {
+    if (mpoEditor && mpoEditor->HasUnsaved())
+        WarnOfLoss();
     if (mpoEditor)
         mpoEditor->Discard();
 }
@@ -240,6 +242,12 @@ krv::datasources::FileAccessState TifDataset::Delete()
         return Dataset::Delete();
     Close();
     return krv::datasources::eDone;
+}
+
+void TifDataset::KeepExisting()
+{
+    if (mpoEditor)
+        mpoEditor->KeepExisting();
 }
 
 void TifDataset::Synchronize()

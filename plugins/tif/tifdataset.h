@@ -44,6 +44,7 @@ public:
     ~TifDataset() override;
 
     krv::datasources::FileAccessState Delete() override;
+    void KeepExisting() override;
     // A new file exists from Create on, though it has its name only after Synchronize.
     bool Exists() const override;
     void Synchronize() override;

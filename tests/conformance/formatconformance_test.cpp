@@ -8,14 +8,22 @@
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/ioverviewaccessor.h"
+#include "datasources/writer/replacingwriter.h"
+#include "gobs/raster/raster.h"
+#include "gobs/raster/rasterinfo.h"
+#include "tests/support/outputcapture.h"
 #include "tests/support/pixels.h"
 #include "tests/support/recipe.h"
+#include "tests/support/thrown.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "tools/conformance/conformance.h"
 #include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
+#include <filesystem>
 #include <memory>
 
 using namespace krv::conformance;
@@ -241,6 +249,98 @@ TEST_P(FormatConformance, LevelsGiveTheRecipesPixels)
 }
 
 // Files of all formats side by side: the manager gives each to its own, whatever it is called.
+void Fill(BasicWriter& oWriter, unsigned char nValue)
+{
+    oWriter.CreateNewFile(krv::gobs::RasterInfo(20, 10, 1, krv::gobs::eDT_8U));
+    const std::unique_ptr<krv::gobs::Raster> oRaster(oWriter.ReadRaster(0, 0, 20, 10));
+    std::fill_n(oRaster->GetBuffer(), 200, nValue);
+    oWriter.WriteRaster(oRaster.get());
+}
+
+// What is not synchronised is lost with a warning, unless an exception says more.
+TEST_P(FormatConformance, WritersTakeFreeNamesAndReplaceWhenTheyAreToldTo)
+{
+    const std::string file = moFolder.File("new"), format = GetParam().moShortName;
+    const auto Holds = [&](char nValue)
+    {
+        return krv::test::ReadPixels(BasicReader(file, {1})) == std::string(200, nValue);
+    };
+    const krv::test::OutputCapture oCapture;
+    {
+        BasicWriter oFirst(file, {1}, format, ""), oSecond(file, {1}, format, ""), oThird(file, {1}, format, "");
+        Fill(oFirst, 1);
+        Fill(oSecond, 2);
+        oFirst.Synchronize();
+        EXPECT_TRUE(oCapture.moWarnings.empty());
+        EXPECT_THROW(oSecond.Synchronize(), krv::IOException);
+        EXPECT_THROW(Fill(oThird, 3), krv::IOException);
+    }
+    EXPECT_EQ(oCapture.moWarnings.size(), 1u) << "the second";
+    EXPECT_TRUE(Holds(1));
+    {
+        ReplacingWriter oDropped(file, {1}, format, "");
+        EXPECT_FALSE(oDropped.FileExists());
+        Fill(oDropped, 4);
+    }
+    EXPECT_EQ(oCapture.moWarnings.size(), 2u);
+    EXPECT_NE(oCapture.moWarnings.back().moMessage.find(file), std::string::npos);
+    try
+    {
+        ReplacingWriter oFailed(file, {1}, format, "");
+        Fill(oFailed, 5);
+        throw krv::DataException("somebody else's");
+    }
+    catch (const krv::DataException&)
+    {
+    }
+    EXPECT_TRUE(Holds(1));
+    ReplacingWriter oNew(file, {1}, format, "");
+    Fill(oNew, 6);
+    EXPECT_TRUE(Holds(1));
+    oNew.Synchronize();
+    EXPECT_TRUE(Holds(6));
+    EXPECT_THROW(ReplacingWriter(file, {}, format, ""), krv::DataException);
+    EXPECT_EQ(oCapture.moWarnings.size(), 2u);
+    EXPECT_EQ(std::distance(std::filesystem::directory_iterator(std::filesystem::path(file).parent_path()), {}), 1);
+}
+
+// Of many processes that make one file one gets its name, whichever, and the others are told.
+TEST_P(FormatConformance, OneOfManyWritersGetsAName)
+{
+    for (int nRound = 0; nRound < 10; ++nRound)
+    {
+        const std::string file = moFolder.File("race" + std::to_string(nRound));
+        int aGate[2] = {};
+        ASSERT_EQ(::pipe(aGate), 0);
+        std::vector<pid_t> oWriters;
+        for (unsigned char nWriter = 1; nWriter <= 5; ++nWriter)
+        {
+            oWriters.push_back(::fork());
+            if (oWriters.back() != 0)
+                continue;
+            BasicWriter oWriter(file, {1}, GetParam().moShortName, "");
+            Fill(oWriter, nWriter);
+            ::close(aGate[1]);
+            char nNothing = 0;
+            static_cast<void>(::read(aGate[0], &nNothing, 1));
+            const std::string error = krv::test::Error([&] { oWriter.Synchronize(); });
+            ::_exit(error.empty() ? 0 : error.starts_with("io: ") ? 1 : 2);
+        }
+        ::close(aGate[1]);
+        ::close(aGate[0]);
+        unsigned char nWinner = 0;
+        for (unsigned char nWriter = 1; nWriter <= 5; ++nWriter)
+        {
+            int nStatus = 0;
+            ::waitpid(oWriters[nWriter - 1], &nStatus, 0);
+            ASSERT_TRUE(WIFEXITED(nStatus) && WEXITSTATUS(nStatus) < 2) << nStatus;
+            EXPECT_TRUE(nWinner == 0 || WEXITSTATUS(nStatus) == 1) << "two have got the name";
+            nWinner = WEXITSTATUS(nStatus) == 0 ? nWriter : nWinner;
+        }
+        EXPECT_EQ(krv::test::ReadPixels(BasicReader(file, {1})), std::string(200, static_cast<char>(nWinner)));
+    }
+}
+
 TEST_P(FormatConformance, TheManagerFindsTheFormat)
 {
     const std::string file = Make(Image(), "misleading.xyz");

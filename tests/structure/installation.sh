@@ -54,6 +54,17 @@ if "$oWork/program/readtiles" "$oWork/missing.tif" >"$oWork/missing.log" 2>&1 ||
     exit 1
 fi
 
+cp -r "$oSource/examples/writetiles" "$oWork/writetiles"
+quietly configure cmake -S "$oWork/writetiles" -B "$oWork/writer" -G Ninja -DCMAKE_CXX_COMPILER="$oCompiler" \
+    -DCMAKE_PREFIX_PATH="$oHome"
+quietly writer cmake --build "$oWork/writer"
+expect "turned.tif has 4 tiles" "$oWork/writer/writetiles" "$oWork/rgb.tif" "$oWork/turned.tif"
+expect "600 x 600" "$oHome/bin/krv" info "$oWork/turned.tif"
+if "$oWork/writer/writetiles" "$oWork/rgb.tif" "$oWork/turned.tif" >"$oWork/taken.log" 2>&1; then
+    echo "a file that is there is written over" >&2
+    exit 1
+fi
+
 export PKG_CONFIG_PATH=$oHome/lib/pkgconfig
 # shellcheck disable=SC2046 # the flags are several words
 quietly pkgconfig "$oCompiler" -std=c++20 "$oWork/readtiles/main.cpp" -o "$oWork/readtiles/plain" \

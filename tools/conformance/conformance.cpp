@@ -6,6 +6,7 @@
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/interfaces/ioverviewio.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/ipctdataset.h"
@@ -20,6 +21,7 @@
 #include "toolkit/ogc/cs/icrs.h"
 #include "tools/conformance/formathome.h"
 #include "tools/conformance/referenceimage.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <dlfcn.h>
 
@@ -721,6 +723,60 @@ void CheckLife(const Plugin& oPlugin, const std::string& sample, Findings& oFind
     Expect(oFindings, Throws([&] { Open(oPlugin, missing); }), "a missing file is opened");
 }
 
+// A part that does not lie inside the image is refused, and nothing of it stored.
+void CheckWrittenParts(IRasterDataset& oRaster, Findings& oFindings)
+{
+    const IOPtr oIO(oRaster.GetRasterIO({1}));
+    const std::size_t nPixelBytes = PixelBytes(oRaster, {1});
+    const auto nRight = static_cast<int>(oIO->GetFileWidth());
+    const auto nBottom = static_cast<int>(oIO->GetFileHeight());
+    const std::string before = ReadWhole(*oIO, nPixelBytes).moBytes;
+    Buffer oBuffer(nPixelBytes * 5 * 4);
+    std::memset(oBuffer.Get(), 90, nPixelBytes * 5 * 4);
+    for (const auto& [nX, nY] : {std::pair(-2, -1), {-2, 0}, {0, -2}, {nRight - 3, 0}, {0, nBottom - 2}, {nRight, 0}})
+        Expect(oFindings,
+               Throws<krv::DataException>([&, nX = nX, nY = nY]
+                                          { oIO->WriteWindow(nX, nY, 5, 4, 1, 1, 3, 2, oBuffer.Get()); }),
+               "a part that is not inside the image is written: 3 x 2 of a window at ", nX, ", ", nY);
+    Expect(oFindings,
+           Throws<krv::DataException>(
+               [&] { oIO->WriteWindow(static_cast<unsigned int>(nRight), 0u, 1u, 1u, oBuffer.Get()); }),
+           "a window that is not inside the image is written");
+    Expect(oFindings, ReadWhole(*oIO, nPixelBytes).moBytes == before, "what is refused is stored in part");
+}
+
+// The sample, where the format updates, and a new file, where it creates: whoever cannot do it says so.
+void CheckWriting(const Plugin& oPlugin, const std::string& sample, Findings& oFindings)
+{
+    const TempFolder oFolder;
+    const std::string copy = oFolder.Write(std::filesystem::path(sample).filename().string(), ReadFile(sample));
+    DatasetPtr oDataset;
+    if (!Throws([&] { oDataset.reset(oPlugin.GetBuilder().Open(copy, eUpdate)); }) && oDataset != nullptr)
+        CheckWrittenParts(Raster(*oDataset), oFindings);
+    oDataset.reset();
+    const std::string file = oFolder.File("new" + std::filesystem::path(sample).extension().string());
+    if (Throws([&] { oDataset.reset(oPlugin.GetBuilder().Create(file, "")); }) || oDataset == nullptr)
+        return;
+    Raster(*oDataset).Create(7, 6, {krv::gobs::eDT_8U});
+    CheckWrittenParts(Raster(*oDataset), oFindings);
+    oDataset->Close();
+    oDataset.reset(oPlugin.GetBuilder().Create(file, ""));
+    if (auto* const poNewFile = dynamic_cast<INewFileDataset*>(oDataset.get()))
+    {
+        const std::string bytes = ReadFile(file);
+        poNewFile->KeepExisting();
+        Expect(oFindings,
+               Throws<krv::IOException>(
+                   [&]
+                   {
+                       Raster(*oDataset).Create(7, 6, {krv::gobs::eDT_8U});
+                       oDataset->Synchronize();
+                   }) &&
+                   ReadFile(file) == bytes,
+               "a new file replaces one that it is to keep");
+    }
+}
+
 void CheckReader(const Plugin& oPlugin, const std::string& sample, Findings& oFindings)
 {
     FormatHome oHome;
@@ -788,6 +844,7 @@ const std::vector<Check>& GetChecks()
         {"overviews", "levels, their sizes and pixels", CheckOverviews},
         {"bitmaps", "bitmaps, their numbers and pixels", CheckBitmaps},
         {"life", "ownership, destruction order, threads, nothing left open, nothing written", CheckLife},
+        {"writing", "parts outside the image, names that are taken", CheckWriting},
         {"reader", "tiles with margins through the manager", CheckReader},
         {"truncated", "files cut at any length: an exception, no crash", CheckTruncated},
         {"damaged", "files with wrong bytes: an exception or pixels, no crash", CheckDamaged},

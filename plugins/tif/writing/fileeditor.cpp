@@ -347,7 +347,7 @@ std::vector<Extent> FileEditor::ListUsed() const
         for (const Tag& oTag : poPage->moTags.GetTags())
             Add(oTag.moStored);
         for (std::size_t nAt = 0; nAt < poPage->GetStriles(); ++nAt)
-            Add({poPage->moOffsets[nAt], poPage->moRoom[nAt], 0});
+            Add({poPage->moOffsets[nAt], std::max(poPage->moRoom[nAt], poPage->moByteCounts[nAt]), 0});
     }
     std::sort(oUsed.begin(), oUsed.end(),
               [](const Extent& oFirst, const Extent& oSecond) { return oFirst.mnOffset < oSecond.mnOffset; });
@@ -436,7 +436,7 @@ void FileEditor::Restart() noexcept
 
 void FileEditor::CreateFile(bool bBigTiff, bool bGap)
 {
-    const std::string temporary = support::MakeTemporaryName(moFileName);
+    const std::string temporary = support::MakeTemporaryName(moFileName, mbReplaces);
     mpoFile = std::make_shared<support::File>(temporary, support::File::Mode::eCreate);
     moTemporary = temporary;
     mpoFile->ShowAs(moFileName);
@@ -692,6 +692,17 @@ bool FileEditor::IsChanged() const
                                     [](const std::shared_ptr<PageModel>& poPage) { return poPage->IsChanged(); });
 }
 
+bool FileEditor::HasUnsaved() const
+{
+    const auto Holds = [](const std::weak_ptr<PageWriter>& poWeak)
+    {
+        const std::shared_ptr<PageWriter> poWriter = poWeak.lock();
+        return poWriter && poWriter->Holds();
+    };
+    return !mbEnded && HasPages() &&
+           (!mbNamed || IsChanged() || std::any_of(moWriters.begin(), moWriters.end(), Holds));
+}
+
 // From the last page to the first: each names the place of the next one.
 std::vector<FileEditor::Written> FileEditor::WriteDirectories()
 {
@@ -756,7 +767,7 @@ void FileEditor::Synchronize()
         Commit(WriteDirectories());
     if (moTemporary.empty())
         return;
-    mpoFile->Rename(moFileName);
+    mpoFile->Rename(moFileName, mbReplaces);
     moTemporary.clear();
     mbNamed = true;
 }
@@ -772,14 +783,17 @@ void FileEditor::Finish()
         Commit(WriteDirectories());
     for (const std::shared_ptr<PageModel>& poPage : moPages)
         LoadTags(*poPage);
-    const std::string laidOut = support::MakeTemporaryName(moFileName);
+    // Only the file that has got the name is replaced by its better form.
+    if (mbNamed)
+        mpoFile->Flush();
+    const std::string laidOut = support::MakeTemporaryName(moFileName, mbNamed || mbReplaces);
     try
     {
         support::File oTarget(laidOut, support::File::Mode::eCreate);
         oTarget.ShowAs(moFileName);
         WriteCloudLayout(moPages, moHeader, *mpoFile, oTarget);
         oTarget.Flush();
-        oTarget.Rename(moFileName);
+        oTarget.Rename(moFileName, mbNamed || mbReplaces);
     }
     catch (...)
     {

@@ -44,6 +44,10 @@ public:
     const FileHeader& GetHeader() const { return moHeader; }
     // Whether the file has its pages, under whatever name.
     bool HasPages() const { return !moPages.empty(); }
+    // A new file takes its name only when nobody has it.
+    void KeepExisting() { mbReplaces = false; }
+    // Whether something would be lost if the editor went now.
+    bool HasUnsaved() const;
     // Whether the file lies under its own name.
     bool IsNamed() const { return mbNamed; }
     std::vector<PageSummary> Summarise() const;
@@ -144,6 +148,7 @@ private:
     bool mbOperation = false;                // one is under way
     bool mbEnded = false;
     bool mbNamed = true;
+    bool mbReplaces = true;
 };
 
 // An operation on the structure of a file: pages that come, go or get other tags. All of it is undone, in memory and in

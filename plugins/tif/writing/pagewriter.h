@@ -36,6 +36,7 @@ public:
               std::size_t nPitch);
     void Write(const support::BlockAddress& oBlock, const support::PixelRect& oPart, const unsigned char* pSource,
                std::size_t nPitch);
+    bool Holds() const { return !moHeld.empty(); }
     // Stores what is held back, as long as the page is there.
     void Flush();
 

@@ -8,6 +8,7 @@
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
 #include "datasources/interfaces/imathmodeldataset.h"
+#include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/interfaces/ioverviewio.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/ipageddataset.h"
@@ -112,6 +113,7 @@ std::vector<Table> Tables()
         {"IPCTDataset",
          {Slot(&PC::GetPCTList), Slot(&PC::GetPCT), Slot(&PC::GetPCTChannel), Slot(&PC::GetPCTDescription),
           Slot(&PC::CreatePCT), Slot(&PC::UpdatePCT), Slot(&PC::SetPCTDescription), Slot(&PC::DeletePCT)}},
+        {"INewFileDataset", {Slot(&INewFileDataset::KeepExisting)}},
         {"IStorageDataset", {Slot(&IStorageDataset::GetUnusedBytes)}},
         {"IPagedDataset", {Slot(&IPagedDataset::CountFurtherImages)}},
         {"IHistoryIO",

@@ -287,4 +287,49 @@ TEST(TifRoom, WhatOthersWroteIsNeverOverwritten)
     KeepsAll("changed elsewhere");
 }
 
+// A file system may know one of the ways to take a free name, or none.
+TEST(TifRoom, AFreeNameIsTakenWithoutTheSystemsHelpToo)
+{
+    const TempFolder oFolder;
+    for (const bool bLinks : {true, false})
+    {
+        const std::string fileName = oFolder.File(bLinks ? "linked.tif" : "plain.tif");
+        const int nResult = Wait(Start(
+            [&]
+            {
+                Deny(SYS_renameat2, EINVAL);
+#ifdef SYS_link
+                if (!bLinks)
+                    Deny(SYS_link, EPERM);
+#endif
+                if (!bLinks)
+                    Deny(SYS_linkat, EPERM);
+                const auto Make = [&](unsigned char nValue)
+                {
+                    TifPointer poDataset = CreateTif(fileName, "");
+                    poDataset->KeepExisting();
+                    poDataset->Create(20, 10, {krv::gobs::eDT_8U});
+                    WriteAll(*poDataset, Bytes(200, nValue));
+                    return poDataset;
+                };
+                const TifPointer poFirst = Make(1), poSecond = Make(2);
+                poFirst->Close();
+                try
+                {
+                    poSecond->Close();
+                }
+                catch (const krv::IOException&)
+                {
+                    return 0;
+                }
+                return 1;
+            }));
+        if (nResult == DENIED)
+            GTEST_SKIP() << "this system cannot deny calls";
+        EXPECT_EQ(nResult, 0);
+        EXPECT_EQ(Judge(fileName).moPixels, Bytes(200, 1));
+    }
+    EXPECT_EQ(ListFolder(oFolder.GetPath()).size(), 2u);
+}
+
 } // namespace

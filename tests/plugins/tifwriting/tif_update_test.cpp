@@ -540,9 +540,9 @@ TEST(TifUpdate, BitmapsKeepTheirNumbersAndAreWrittenTogether)
     {
         const IOPointer poIO(poDataset->GetBitmapIO({3, 1}));
         poIO->WriteWindow(0u, 0u, 61u, 43u, oBits.data());
-        // A part whose window begins outside the image: 3 x 2 pixels of it at (0, 1).
+        // A part whose window begins outside the image: 3 x 2 pixels at (0, 1).
         Bytes oWindow(10 * 10 * 2, 1);
-        poIO->WriteWindow(-4, -3, 10, 10, 2, 4, 5, 2, oWindow.data());
+        poIO->WriteWindow(-4, -3, 10, 10, 4, 4, 3, 2, oWindow.data());
         EXPECT_THROW(poIO->WriteWindow(0u, 1u, 61u, 43u, oBits.data()), krv::DataException);
     }
     poDataset->Close();

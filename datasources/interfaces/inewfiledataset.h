@@ -1,0 +1,20 @@
+#pragma once
+
+#include "datasources/api.h"
+
+namespace krv::datasources
+{
+
+// A dataset whose file may still have to get its name. The order of the virtual operations is public and fixed.
+class KRV_DATASOURCES_API INewFileDataset
+{
+public:
+    virtual ~INewFileDataset();
+
+    // From now on a new file takes its name only when no other file has it: the call that gives the name throws
+    // krv::IOException otherwise, leaves the other file as it is, and may be tried again. Unless this is called a new
+    // file replaces one of its name. Does nothing for a file that has its name.
+    virtual void KeepExisting() = 0;
+};
+
+} // namespace krv::datasources
