@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstddef>
 #include <source_location>
 #include <string>
 #include <string_view>
@@ -8,19 +9,22 @@ namespace krv
 {
 
 // Turns a compiler's file name into the name by which the library reports a source file: the path from the root of the
-// source tree without its ending, such as "datasources/reader/basicreader".
+// source tree without its ending, such as "datasources/reader/basicreader". The tree may lie below folders that are
+// named like its own: the last one in the path counts, unless the path begins with one.
 constexpr std::string_view SourceFileText(std::string_view file)
 {
     constexpr std::string_view ROOTS[] = {"datasources/", "toolkit/", "gobs/", "plugins/", "tools/"};
-    for (std::string_view root : ROOTS)
+    std::size_t nLast = 0;
+    bool bBegins = false;
+    for (const std::string_view root : ROOTS)
     {
-        const auto nAt = file.rfind(root);
-        if (nAt != std::string_view::npos && (nAt == 0 || file[nAt - 1] == '/'))
-        {
-            file.remove_prefix(nAt);
-            break;
-        }
+        bBegins = bBegins || file.starts_with(root);
+        for (std::size_t nAt = file.find(root); nAt != std::string_view::npos; nAt = file.find(root, nAt + 1))
+            if (nAt > nLast && file[nAt - 1] == '/')
+                nLast = nAt;
     }
+    if (!bBegins)
+        file.remove_prefix(nLast);
     const auto nDot = file.rfind('.');
     return nDot == std::string_view::npos ? file : file.substr(0, nDot);
 }
