@@ -136,7 +136,8 @@ struct DatasetManager::Shared
 
     std::vector<std::unique_ptr<IFileIOBuilder>> moPrimary;
     std::vector<std::unique_ptr<IFileIOBuilder>> moSecondary;
-    std::mutex moCapabilitiesMutex; // guards moCapabilities; nothing else is locked under it
+    // Guards moCapabilities, and moXmlPaths of every manager; nothing else is locked under it.
+    std::mutex moCapabilitiesMutex;
     std::map<std::string, std::unique_ptr<FormatCapabilities>> moCapabilities;
     bool mbHoldsXml = false;
 };
@@ -204,7 +205,10 @@ void DatasetManager::Register(IFileIOBuilder* poBuilder, const std::string& xmlP
     moFormatList.reserve(moFormatList.size() + 1);
     oOwners.reserve(oOwners.size() + 1);
     (bPrimary ? moPrimaryBuilders : moSecondaryBuilders)[poFormat] = poBuilder;
-    moXmlPaths[name] = xmlPath;
+    {
+        const std::lock_guard oPathsLock(mpoShared->moCapabilitiesMutex);
+        moXmlPaths[name] = xmlPath;
+    }
     moFormatsByName[name] = poFormat;
     moFormatList.push_back(poFormat);
     oOwners.emplace_back(poBuilder);

@@ -78,6 +78,7 @@ private:
     IDataset* OpenRecognised(const std::string& name, const unsigned char* pHeader, AccessMode eMode, bool& bFound);
     IFileIOBuilder* FindBuilder(const BuilderMap& oBuilders, const std::string& name, const unsigned char* pHeader);
     IFileIOBuilder* FindBuilder(const IFileFormat* poFormat) const;
+    // The caller holds the lock of the capabilities.
     std::string GetXMLPath(const std::string& shortName) const;
     bool FileExists(const std::string& fileName) const;
 
@@ -86,13 +87,13 @@ private:
     BuilderMap moPrimaryBuilders;
     BuilderMap moSecondaryBuilders;
     std::map<std::string, const IFileFormat*> moFormatsByName;
-    std::map<std::string, std::string> moXmlPaths;
+    std::map<std::string, std::string> moXmlPaths; // guarded like the capabilities, which any thread asks for
     std::vector<const IFileFormat*> moFormatList;
     IFileIOBuilder* mpoLastBuilder = nullptr;
 
     static DatasetManager* mpoManager;
-    // Guards the instance and every registry member; re-entrant, since format libraries register while GetInstance runs
-    // and NewDataset calls Open.
+    // Guards the instance and every other registry member; re-entrant, since format libraries register while
+    // GetInstance runs and NewDataset calls Open.
     static krv::threading::Mutex moMutex;
 };
 

@@ -32,7 +32,7 @@ void TileIterator::SetChunkSize(unsigned int nWidth, unsigned int nHeight)
     const unsigned int nTileHeight = std::max(nHeight, 1u);
     const std::uint64_t nColumns = TilesAlong(mnWidth, nTileWidth);
     const std::uint64_t nRows = TilesAlong(mnHeight, nTileHeight);
-    if (nColumns * nRows > static_cast<std::uint64_t>(std::numeric_limits<std::int32_t>::max()))
+    if (nColumns * nRows > std::numeric_limits<unsigned int>::max())
         throw DataException("Tiles of " + std::to_string(nTileWidth) + " x " + std::to_string(nTileHeight) +
                             " pixels are too many for an image of " + std::to_string(mnWidth) + " x " +
                             std::to_string(mnHeight));

@@ -35,8 +35,8 @@ class KRV_GOBS_API TileIterator
 public:
     TileIterator(unsigned int nWidth, unsigned int nHeight);
 
-    // Sets the tile size; 0 counts as 1. Throws DataException, and changes nothing, when the grid would have more tiles
-    // than a signed 32-bit number counts.
+    // Sets the tile size; 0 counts as 1. Throws DataException, and changes nothing, when the grid would have more than
+    // 4294967295 tiles.
     void SetChunkSize(unsigned int nWidth, unsigned int nHeight);
 
     // Index of the last tile; 4294967295, so that one more is 0, for an image without pixels.

@@ -64,10 +64,15 @@ TEST(TileIteratorTest, LargestImages)
     EXPECT_EQ(oGrid.GetTile(3), Tile(0x80000000u, 0x80000001u, 0x7FFFFFFFu, 0x7FFFFFFEu));
     EXPECT_EQ(oGrid.GetTileIndex(0xFFFFFFFEu, 0xFFFFFFFEu), 3u);
 
-    TileIterator oLine(0x7FFFFFFFu, 1);
+    TileIterator oLine(0xFFFFFFFFu, 1);
     oLine.SetChunkSize(0, 0);
-    EXPECT_EQ(oLine.GetTileRange(), 0x7FFFFFFEu);
-    EXPECT_EQ(oLine.GetTile(0x7FFFFFFEu), Tile(0x7FFFFFFEu, 0, 1, 1));
-    TileIterator oTooLong(0x80000000u, 1);
-    EXPECT_THROW(oTooLong.SetChunkSize(1, 1), DataException);
+    EXPECT_EQ(oLine.GetTileRange(), 0xFFFFFFFEu);
+    EXPECT_EQ(oLine.GetTile(0xFFFFFFFEu), Tile(0xFFFFFFFEu, 0, 1, 1));
+    EXPECT_EQ(oLine.GetTileIndex(0xFFFFFFFEu, 0), 0xFFFFFFFEu);
+    EXPECT_THROW(oLine.GetTile(0xFFFFFFFFu), OutOfBoundsException);
+    // A grid of 65535 x 65537 tiles has as many as can be counted, one more row too many.
+    TileIterator oMost(65535, 65538);
+    EXPECT_THROW(oMost.SetChunkSize(1, 1), DataException);
+    oMost.SetChunkSize(1, 2);
+    EXPECT_EQ(oMost.GetTileRange(), 65535u * 32769u - 1);
 }

@@ -41,7 +41,7 @@ std::vector<unsigned char> MakeDirectory(const PageModel& oPage, const FileHeade
         AppendNumber(oBytes, nType, 2, bOrder);
         AppendNumber(oBytes, nCount, nWord, bOrder);
     };
-    const auto AddArray = [&](std::uint16_t nTag, const std::vector<std::uint64_t>& oValues, std::uint64_t nPlace)
+    const auto AddArray = [&](std::uint16_t nTag, const StrileList<std::uint64_t>& oValues, std::uint64_t nPlace)
     {
         AddEntry(nTag, oHeader.mbBigTiff ? TIFF_LONG8 : TIFF_LONG, oPage.GetStriles());
         AppendNumber(oBytes, oPage.GetStriles() == 1 ? oValues.front() : nPlace, nWord, bOrder);
@@ -74,7 +74,7 @@ std::vector<unsigned char> MakeDirectory(const PageModel& oPage, const FileHeade
     return oBytes;
 }
 
-std::vector<unsigned char> MakeArray(const std::vector<std::uint64_t>& oValues, const FileHeader& oHeader)
+std::vector<unsigned char> MakeArray(const StrileList<std::uint64_t>& oValues, const FileHeader& oHeader)
 {
     std::vector<unsigned char> oBytes;
     oBytes.reserve(oValues.size() * WordBytes(oHeader));

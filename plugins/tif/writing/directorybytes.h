@@ -19,6 +19,6 @@ std::vector<unsigned char> MakeDirectory(const PageModel& oPage, const FileHeade
                                          std::uint64_t nCountArray, std::uint64_t nNext);
 
 // The values of such an array.
-std::vector<unsigned char> MakeArray(const std::vector<std::uint64_t>& oValues, const FileHeader& oHeader);
+std::vector<unsigned char> MakeArray(const StrileList<std::uint64_t>& oValues, const FileHeader& oHeader);
 
 } // namespace krv::plugins::tif

@@ -628,7 +628,7 @@ FileEditor::Written FileEditor::WriteDirectory(PageModel& oPage, std::uint64_t n
     const std::uint64_t nStriles = oPage.GetStriles();
     Written oWritten{&oPage, {}, nNext, oPage.moOffsetArray, oPage.moCountArray};
 
-    const auto WriteArray = [&](const std::vector<std::uint64_t>& oValues, Extent& oArray)
+    const auto WriteArray = [&](const StrileList<std::uint64_t>& oValues, Extent& oArray)
     {
         if (nStriles * nWord <= nWord || bDraft ||
             (!oPage.mbStrilesChanged && !oPage.mbArraysStale && oArray.mnBytes != 0))

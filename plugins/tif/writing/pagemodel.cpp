@@ -158,10 +158,10 @@ Strile PageModel::Get(std::uint64_t nIndex) const
 
 void PageModel::SetStriles(std::uint64_t nStriles)
 {
-    moOffsets.assign(nStriles, 0);
-    moByteCounts.assign(nStriles, 0);
-    moRoom.assign(nStriles, 0);
-    moGenerations.assign(nStriles, 0);
+    moOffsets = StrileList<std::uint64_t>(nStriles);
+    moByteCounts = StrileList<std::uint64_t>(nStriles);
+    moRoom = StrileList<std::uint64_t>(nStriles);
+    moGenerations = StrileList<std::uint32_t>(nStriles);
 }
 
 std::uint64_t PageModel::CountStriles() const

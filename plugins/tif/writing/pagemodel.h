@@ -8,12 +8,48 @@
 #include "gobs/raster/datatype.h"
 
 #include <cstdint>
+#include <cstdlib>
 #include <memory>
+#include <new>
 #include <string>
 #include <vector>
 
 namespace krv::plugins::tif
 {
+
+// Memory that comes zeroed from the system and that a value is only written to where it differs: the tables of a sparse
+// giant take pages for what was stored, not for what could be.
+template <typename T>
+struct ZeroedAllocator
+{
+    using value_type = T;
+
+    ZeroedAllocator() = default;
+    template <typename Other>
+    ZeroedAllocator(const ZeroedAllocator<Other>&)
+    {
+    }
+
+    T* allocate(std::size_t nCount)
+    {
+        void* pBlock = std::calloc(nCount, sizeof(T));
+        if (pBlock == nullptr)
+            throw std::bad_alloc();
+        return static_cast<T*>(pBlock);
+    }
+    void deallocate(T* pBlock, std::size_t) { std::free(pBlock); }
+    template <typename... Arguments>
+    void construct(T* pValue, Arguments&&... oArguments)
+    {
+        const T nValue(oArguments...);
+        if (*pValue != nValue)
+            *pValue = nValue;
+    }
+    friend bool operator==(const ZeroedAllocator&, const ZeroedAllocator&) { return true; }
+};
+
+template <typename T>
+using StrileList = std::vector<T, ZeroedAllocator<T>>;
 
 // A page of a file that is being written: its tags, where its strips or tiles lie, and what of it stands in the file.
 class PageModel : public IStrileIndex
@@ -25,6 +61,7 @@ public:
     Strile Get(std::uint64_t nIndex) const override;
 
     std::uint64_t GetStriles() const { return moOffsets.size(); }
+    // All of them not stored.
     void SetStriles(std::uint64_t nStriles);
     // In terms of the tags: geometry and role; its offset is the page's number.
     PageSummary Summarise() const;
@@ -39,10 +76,10 @@ public:
 
     std::uint64_t mnNumber = 0; // stays with the page
     TagList moTags;
-    std::vector<std::uint64_t> moOffsets;
-    std::vector<std::uint64_t> moByteCounts;
-    std::vector<std::uint64_t> moRoom;        // bytes taken in the file
-    std::vector<std::uint32_t> moGenerations; // of the space that each takes
+    StrileList<std::uint64_t> moOffsets;
+    StrileList<std::uint64_t> moByteCounts;
+    StrileList<std::uint64_t> moRoom;        // bytes taken in the file
+    StrileList<std::uint32_t> moGenerations; // of the space that each takes
     bool mbStrilesChanged = false;
     bool mbArraysStale = false; // the arrays in the file are of other types than are written here
     bool mbBelowFirst = false;  // listed by the first page, not in the chain

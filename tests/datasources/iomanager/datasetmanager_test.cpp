@@ -10,7 +10,9 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <chrono>
 #include <future>
+#include <utility>
 
 using namespace krv::datasources;
 using krv::test::ExpectNoPlace;
@@ -259,6 +261,25 @@ TEST_F(DatasetManagerTest, FormatsByNameAndTheirCapabilities)
         EXPECT_EQ(typeid(oException), typeid(krv::Exception));
         ExpectPlace(oException, "DatasetManager::GetXMLPath(", SOURCE_FILE, 468);
     }
+}
+
+// What the thread sanitizer watches: a name that is not known yet is looked up anew each time.
+TEST_F(DatasetManagerTest, CapabilitiesAreAskedForWhileFormatsRegister)
+{
+    DatasetManager& oManager = Manager();
+    std::promise<void> oAsking;
+    const auto Ask = [&]
+    {
+        bool bFirst = true;
+        while (!krv::test::Error([&] { oManager.GetCapabilities("F49"); }).empty())
+            if (std::exchange(bFirst, false))
+                oAsking.set_value();
+    };
+    const std::future<void> oAsked = std::async(std::launch::async, Ask);
+    oAsking.get_future().wait();
+    for (unsigned int nFormat = 0; nFormat < 50; ++nFormat)
+        Register("F" + std::to_string(nFormat));
+    EXPECT_EQ(oAsked.wait_for(std::chrono::seconds(60)), std::future_status::ready);
 }
 
 TEST_F(DatasetManagerTest, OpenFormatKnowsTheOtherBuildersOnly)

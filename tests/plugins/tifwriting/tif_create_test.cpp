@@ -4,10 +4,12 @@
 #include <algorithm>
 #include <cstring>
 #include <filesystem>
+#include <fstream>
 #include <random>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/resource.h>
 #include <tiff.h>
 
 namespace
@@ -202,6 +204,59 @@ TEST(TifCreate, OptionsAndTypesThatDoNotGoTogetherAreNamed)
     EXPECT_NE(Message("", {}), "");
     EXPECT_NE(Message("", {krv::gobs::eDT_BIT}), "");
     EXPECT_TRUE(ListFolder(oFolder.GetPath()).empty());
+}
+
+// The most memory that this process has had, in MiB.
+long PeakMemory()
+{
+    rusage oUsage = {};
+    getrusage(RUSAGE_SELF, &oUsage);
+    return oUsage.ru_maxrss >> 10;
+}
+
+TEST(TifCreate, SizesAreRefusedBeforeTheirTablesAreMade)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("a.tif");
+    const long nBefore = PeakMemory();
+    for (const char* pOptions : {"BLOCKXSIZE=16 BLOCKYSIZE=16", "TILED=NO BLOCKYSIZE=1 INTERLEAVE=BAND"})
+    {
+        const unsigned int nChannels = pOptions[0] == 'T' ? 1000 : 1;
+        const std::string error =
+            Error([&] { CreateTif(fileName, pOptions, 270000, 270000, nChannels, krv::gobs::eDT_8U); });
+        EXPECT_THAT(error, testing::HasSubstr("strips or tiles; choose larger ones"));
+        EXPECT_LT(PeakMemory() - nBefore, 64);
+    }
+    // Legal giants of which little is stored take little.
+    {
+        TifPointer poDataset = CreateTif(fileName, "", 100000, 100000, 1, krv::gobs::eDT_8U);
+        Bytes oPixels(160 * 160, 7);
+        const IOPointer poIO(poDataset->GetRasterIO({1}));
+        poIO->WriteWindow(99840u, 99840u, 160u, 160u, oPixels.data());
+        poDataset->Close();
+    }
+    EXPECT_LT(std::filesystem::file_size(fileName), 4u << 20);
+    // A file that claims tables of tiles of 16 which it does not hold.
+    std::string bytes = ReadFile(fileName);
+    const auto Number = [&bytes](std::size_t nAt, std::uint32_t nValue)
+    {
+        std::memcpy(&bytes[nAt], &nValue, 4);
+    };
+    std::uint64_t nDirectory = 0;
+    std::memcpy(&nDirectory, &bytes[8], 8);
+    ASSERT_EQ(bytes.substr(0, 3), "II+");
+    for (std::size_t nAt = nDirectory + 8; nAt < nDirectory + 8 + 20 * 13u; nAt += 20)
+    {
+        std::uint16_t nTag = 0;
+        std::memcpy(&nTag, &bytes[nAt], 2);
+        if (nTag == TIFFTAG_TILEWIDTH || nTag == TIFFTAG_TILELENGTH)
+            Number(nAt + 12, 16);
+        if (nTag == TIFFTAG_TILEOFFSETS || nTag == TIFFTAG_TILEBYTECOUNTS)
+            Number(nAt + 4, 6250 * 6250);
+    }
+    std::ofstream(fileName, std::ios::binary) << bytes;
+    EXPECT_THAT(Error([&] { OpenTif(fileName, eUpdate); }), testing::HasSubstr("claim far more than the file holds"));
+    EXPECT_LT(PeakMemory() - nBefore, 128);
 }
 
 TEST(TifCreate, LargeImagesAreBigTiffInTime)
