@@ -4,6 +4,7 @@
 #include "datasources/interfaces/ichannelfilter.h"
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/iencodedblocks.h"
 #include "datasources/interfaces/iephemerisdataset.h"
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/interfaces/ifileiobuilder.h"
@@ -26,6 +27,7 @@ IBitmapDataset::~IBitmapDataset() = default;
 IChannelFilter::~IChannelFilter() = default;
 IChannelInfo::~IChannelInfo() = default;
 IDataset::~IDataset() = default;
+IEncodedBlocks::~IEncodedBlocks() = default;
 IEphemerisDataset::~IEphemerisDataset() = default;
 IFileFormat::~IFileFormat() = default;
 IFileIOBuilder::~IFileIOBuilder() = default;

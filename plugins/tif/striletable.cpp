@@ -74,7 +74,7 @@ StrileEntries::StrileEntries(const RawDirectory& oDirectory)
 IStrileIndex::~IStrileIndex() = default;
 
 std::uint64_t FindOnlyStripBytes(const Strile& oStrip, const StrileShape& oShape, const RawDirectory& oDirectory,
-                                 const std::vector<std::uint64_t>& oOffsets, std::uint64_t nFileBytes)
+                                 std::span<const std::uint64_t> oOffsets, std::uint64_t nFileBytes)
 {
     if (IsLongEnough(oStrip, oShape))
         return oShape.mnPlainBytes != 0 ? oShape.mnPlainBytes : oStrip.mnBytes;

@@ -5,6 +5,7 @@
 
 #include <cstdint>
 #include <memory>
+#include <span>
 #include <vector>
 
 namespace krv::plugins::tif
@@ -77,7 +78,7 @@ struct StrileShape
 // compression, one too small for its rows, it reaches up to what the file is known to hold next.
 // oOffsets: of the strips of all planes.
 std::uint64_t FindOnlyStripBytes(const Strile& oStrip, const StrileShape& oShape, const RawDirectory& oDirectory,
-                                 const std::vector<std::uint64_t>& oOffsets, std::uint64_t nFileBytes);
+                                 std::span<const std::uint64_t> oOffsets, std::uint64_t nFileBytes);
 
 // Where strips and tiles lie while a file is being written: known in memory before it stands in the file.
 class IStrileIndex

@@ -134,6 +134,7 @@ std::unique_ptr<support::IBlockSource> TifDataset::MakeSource(const std::shared_
         return MakePageSource(std::move(poPage), eUse);
     const auto poWriter = std::make_shared<PageWriter>(mpoEditor, poModel, std::move(poPage), eUse);
     mpoEditor->Register(poWriter);
+    moWriters[poModel->mnNumber] = poWriter;
     return std::make_unique<EditedSource>(poWriter);
 }
 
@@ -149,6 +150,7 @@ FileEditor& TifDataset::GetEditor(const char* pWhat, const Place& oPlace) const
 
 void TifDataset::ForgetPages() const
 {
+    moCodedPages.clear();
     mpoPages.reset();
     moBooks.clear();
     moGeocoding.reset();
@@ -273,6 +275,7 @@ void TifDataset::Close()
     }
     Dataset::Close();
     moImages.clear();
+    moCodedPages.clear();
     mpoPage.reset();
     mpoFile.reset();
 }

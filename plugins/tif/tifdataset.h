@@ -1,6 +1,7 @@
 #pragma once
 
 #include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/iencodedblocks.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
@@ -34,7 +35,8 @@ class TifDataset : public support::Dataset,
                    public krv::datasources::IBitmapDataset,
                    public krv::datasources::IPCTDataset,
                    public krv::datasources::IStorageDataset,
-                   public krv::datasources::IPagedDataset
+                   public krv::datasources::IPagedDataset,
+                   public krv::datasources::IEncodedBlocks
 {
 public:
     // Throws krv::FileException kinds that name file and cause; nothing stays open then.
@@ -94,6 +96,13 @@ public:
 
     std::optional<std::uint64_t> GetUnusedBytes() override;
 
+    krv::datasources::EncodedForm GetEncodedForm(unsigned int nLevel) override;
+    bool ReadEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock,
+                     std::vector<unsigned char>& oBytes) override;
+    bool SetEncodedForm(unsigned int nLevel, const krv::datasources::EncodedForm& oForm) override;
+    void StoreEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock, const unsigned char* pBytes,
+                      std::size_t nBytes) override;
+
     // For the overview managers: the levels of the image or of its mask, and the pixels of a page.
     const std::vector<PageLevel>& GetLevels(PixelUse eUse) const;
     // The number of the bitmap that the mask levels belong to; 0 when there is none.
@@ -135,11 +144,16 @@ private:
     krv::datasources::AuxiliaryData ReadRecord() const;
     // Says once what is wrong with the file and does not keep it from being read.
     void Complain(const std::string& trouble) const;
+    // What a level's page is known by, and the page as its blocks are read.
+    std::uint64_t FindLevelPage(unsigned int nLevel, const Place& oPlace) const;
+    Page& GetCodedPage(unsigned int nLevel, const Place& oPlace);
 
     std::shared_ptr<FileEditor> mpoEditor; // null when the file is only read
     std::shared_ptr<support::File> mpoFile;
     mutable std::shared_ptr<Page> mpoPage;
     std::weak_ptr<PageWriter> mpoImageWriter;
+    std::map<std::uint64_t, std::weak_ptr<PageWriter>> moWriters;        // of the pages that were opened, by number
+    mutable std::map<std::uint64_t, std::shared_ptr<Page>> moCodedPages; // whose blocks are read as bytes
     std::string moResampling;
     mutable std::map<PixelUse, krv::datasources::AuxiliaryData> moBooks;
     mutable std::unique_ptr<PageTable> mpoPages;

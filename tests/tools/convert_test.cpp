@@ -3,18 +3,26 @@
 #include "datasources/interfaces/accessmode.h"
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/iencodedblocks.h"
+#include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/irasterio.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/metadata/displaydefaults.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/multitypereader.h"
+#include "datasources/reader/validitysource.h"
 #include "datasources/writer/basicwriter.h"
+#include "gobs/mask/mask.h"
+#include "gobs/raster/raster.h"
 #include "tests/support/demofile.h"
 #include "tests/support/facts.h"
 #include "tests/support/pixels.h"
+#include "tests/support/thrown.h"
 #include "tests/tools/programrun.h"
 #include "tools/conformance/tempfolder.h"
+#include "tools/krv/conversion.h"
 
 #include <gtest/gtest.h>
 
@@ -126,6 +134,210 @@ TEST(Convert, RealFilesKeepPixelsAndInformationInEveryLayout)
         EXPECT_EQ(json::diff(oKept, Kept(back)), json::array());
     }
     EXPECT_GT(nForm, 30U);
+}
+
+// Where two images, or levels of them, are stored in another way; empty when every byte of their blocks is the same.
+std::string DescribeDifference(krv::datasources::IEncodedBlocks& oOne, krv::datasources::IEncodedBlocks& oOther,
+                               unsigned int nLevel)
+{
+    const auto oForm = oOne.GetEncodedForm(nLevel);
+    if (oForm != oOther.GetEncodedForm(nLevel))
+        return "the form of level " + std::to_string(nLevel);
+    std::vector<unsigned char> oBytes, oOthers;
+    for (unsigned int nPlane = 0; nPlane < (oForm.mbSeparate ? oForm.mnChannels : 1); ++nPlane)
+        for (unsigned int nY = 0; nY * oForm.mnBlockHeight < oForm.mnHeight; ++nY)
+            for (unsigned int nX = 0; nX * oForm.mnBlockWidth < oForm.mnWidth; ++nX)
+                if (oOne.ReadEncoded(nLevel, {nPlane, nX, nY}, oBytes) !=
+                        oOther.ReadEncoded(nLevel, {nPlane, nX, nY}, oOthers) ||
+                    oBytes != oOthers)
+                    return "block " + std::to_string(nX) + ", " + std::to_string(nY);
+    return "";
+}
+
+// 1 for the image, and its levels.
+std::vector<unsigned int> LevelsOf(IDataset& oDataset)
+{
+    const std::unique_ptr<krv::datasources::IOverviewManager> poManager(
+        dynamic_cast<krv::datasources::IRasterDataset&>(oDataset).GetOverviewManager());
+    std::vector<unsigned int> oLevels = poManager->GetLevels();
+    oLevels.insert(oLevels.begin(), 1);
+    return oLevels;
+}
+
+// Bytes move, so that copies are no larger, nothing is encoded a second time and levels stay what they are. Of codecs
+// with an order of bytes those of big-endian files are encoded anew, by the same codec.
+TEST(Convert, RealFilesAreStoredAsTheyWere)
+{
+    constexpr std::uintmax_t TAG_BYTES = 2048; // numbers and levels are recorded, one-valued tags spelt out
+    const TempFolder oFolder;
+    const std::string copy = oFolder.File("copy.tif");
+    std::size_t nMoved = 0, nFiles = 0;
+    for (const Facts& oRow : krv::test::GetFacts())
+    {
+        SCOPED_TRACE(oRow["file"]);
+        // In this process: a command for each file would take minutes.
+        if (const std::string error = krv::test::Error(
+                [&] {
+                    Convert({{oRow.GetPath()}, {}, {}, {}}, {copy, "", ""});
+                });
+            !error.empty())
+        {
+            EXPECT_NE(RunKrv({"checksum", oRow.GetPath()}).code, 0) << error;
+            continue;
+        }
+        ++nFiles;
+        const auto poOld = OpenFile(oRow.GetPath(), eReadOnly), poNew = OpenFile(copy, eReadOnly);
+        auto& oOld = dynamic_cast<krv::datasources::IEncodedBlocks&>(*poOld);
+        auto& oNew = dynamic_cast<krv::datasources::IEncodedBlocks&>(*poNew);
+        const std::vector<unsigned int> oLevels = LevelsOf(*poOld);
+        EXPECT_EQ(LevelsOf(*poNew), oLevels);
+        EXPECT_LE(std::filesystem::file_size(copy),
+                  std::filesystem::file_size(oRow.GetPath()) * 11 / 10 + TAG_BYTES * oLevels.size());
+        for (const unsigned int nLevel : oLevels)
+        {
+            const auto oForm = oOld.GetEncodedForm(nLevel);
+            EXPECT_EQ(oForm.moCodec, oNew.GetEncodedForm(nLevel).moCodec);
+            const std::string level = std::to_string(nLevel);
+            const bool bMoved = oForm.mbReadable && !oForm.mbBigEndian;
+            if (bMoved)
+                EXPECT_EQ(DescribeDifference(oOld, oNew, nLevel), "");
+            else
+                EXPECT_EQ(RunKrv({"checksum", copy, "--level", level}).output,
+                          RunKrv({"checksum", oRow.GetPath(), "--level", level}).output);
+            nMoved += bMoved ? 1 : 0;
+        }
+    }
+    if (nFiles == 0)
+        GTEST_SKIP() << "no folder of real files";
+    EXPECT_GT(nMoved, 200U);
+}
+
+// Explicit options win; what they leave open stays as the file has it, and a line says what the format lacks.
+TEST(Convert, KeepsHowTheFileIsStoredWhereNoOptionSaysOtherwise)
+{
+    const TempFolder oFolder;
+    const std::string demo = oFolder.File("a.dem"), file = oFolder.File("a.tif"), out = oFolder.File("out.tif");
+    krv::test::WriteDemoFile(demo, 300, 200, {krv::gobs::eDT_16U, krv::gobs::eDT_16U});
+    ASSERT_EQ(
+        RunConvert({demo, file, "--options", "COMPRESS=LZW PREDICTOR=2 BLOCKXSIZE=64 BLOCKYSIZE=32 INTERLEAVE=BAND"})
+            .code,
+        0);
+    ASSERT_EQ(RunKrv({"overviews", file, "--levels", "2,5", "--resampling", "min"}).code, 0);
+    struct Case
+    {
+        Texts moArguments;
+        std::string moForm; // codec, predictor, planes, block
+        std::string moSaid;
+    };
+    const Case CASES[] = {
+        {{}, "LZW 2 band 64 x 32", ""},
+        {{"--window", "8,0,200,100"}, "LZW 2 band 64 x 32", ""},
+        {{"--channels", "2"}, "LZW 2 pixel 64 x 32", ""},
+        {{"--type", "32R"}, "LZW 3 band 64 x 32", ""},
+        {{"--options", "COMPRESS=ZSTD"}, "ZSTD 2 band 64 x 32", ""},
+        {{"--options", "compress=lzw predictor=no"}, "LZW 1 band 64 x 32", ""},
+        {{"--options", "BLOCKXSIZE=128 INTERLEAVE=PIXEL"}, "LZW 2 pixel 128 x 32", ""},
+        {{"--options", "TILED=NO"}, "LZW 2 band 300 x 200", ""},
+        {{"--options", "LAYOUT=COG"}, "LZW 2 band 64 x 32", ""},
+        {{"--type", "8U", "--options", "COMPRESS=JPEG"}, "JPEG 1 band 64 x 32", "16U to 8U"},
+    };
+    for (const Case& oCase : CASES)
+    {
+        Texts oArguments = {file, out};
+        oArguments.insert(oArguments.end(), oCase.moArguments.begin(), oCase.moArguments.end());
+        SCOPED_TRACE(oCase.moForm + (oCase.moArguments.empty() ? "" : " " + oCase.moArguments.back()));
+        const auto oRun = RunConvert(oArguments);
+        ASSERT_EQ(oRun.code, 0) << oRun.errors;
+        EXPECT_EQ(oRun.errors.empty(), oCase.moSaid.empty()) << oRun.errors;
+        EXPECT_NE(oRun.errors.find(oCase.moSaid), std::string::npos) << oRun.errors;
+        const auto poOut = OpenFile(out, eReadOnly);
+        auto& oRaster = dynamic_cast<krv::datasources::IRasterDataset&>(*poOut);
+        const auto oForm = dynamic_cast<krv::datasources::IEncodedBlocks&>(*poOut).GetEncodedForm(1);
+        EXPECT_EQ(oForm.moCodec + " " + std::to_string(oForm.mnPredictor) + (oForm.mbSeparate ? " band " : " pixel ") +
+                      std::to_string(oForm.mnBlockWidth) + " x " + std::to_string(oForm.mnBlockHeight),
+                  oCase.moForm);
+        const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(oRaster.GetOverviewManager());
+        ASSERT_EQ(poLevels->GetLevels(), (std::vector<unsigned int>{2, 5}));
+        EXPECT_EQ(poLevels->GetResamplingName(), "MIN");
+        EXPECT_TRUE(poLevels->IsValid(1, 5));
+    }
+    EXPECT_EQ(RunKrv({"checksum", out, "--level", "5"}).code, 0);
+    const auto oLeft = RunConvert({file, oFolder.File("b.demo")});
+    EXPECT_EQ(oLeft.code, 0);
+    for (const char* pWord : {"compression LZW", "interleaving by band", "tiles of 64 x 32", "levels are not kept"})
+        EXPECT_NE(oLeft.errors.find(pWord), std::string::npos) << oLeft.errors;
+}
+
+// A part of an image in JPEG is stored without further loss, and its no-data value holds; encoding with loss makes a
+// mask of it, for the levels too, since values near it mean nothing.
+TEST(Convert, LossyCodecsKeepValidityAndAreNotAppliedUnasked)
+{
+    const TempFolder oFolder;
+    const std::string demo = oFolder.File("a.dem"), lossless = oFolder.File("a.tif"), lossy = oFolder.File("b.tif"),
+                      out = oFolder.File("out.tif");
+    krv::test::WriteDemoFile(demo, 400, 300, {krv::gobs::eDT_8U}, {{"NO_DATA_VALUE", "0"}});
+    ASSERT_EQ(RunConvert({demo, lossless}).code, 0);
+    {
+        krv::datasources::BasicWriter oWriter(lossless);
+        krv::gobs::Raster oRaster({150, 300, 1, krv::gobs::eDT_8U}, {100, 0});
+        std::fill_n(oRaster.GetBuffer(), oRaster.GetBufferSize(), static_cast<unsigned char>(0));
+        oWriter.WriteRaster(&oRaster);
+        oWriter.Synchronize();
+    }
+    const auto Valid = [](const std::string& file, const std::vector<unsigned int>& oWindow)
+    {
+        const auto poFile = OpenFile(file, eReadOnly);
+        const krv::datasources::ValiditySource oValidity(poFile.get());
+        BasicReader oReader(file);
+        const std::unique_ptr<krv::gobs::Raster> poPixels(
+            oReader.ReadRaster(oWindow[0], oWindow[1], oWindow[2], oWindow[3]));
+        const std::unique_ptr<krv::gobs::Mask> poMask(oValidity.BuildMask(*poPixels));
+        return std::string(poMask->GetBits(), poMask->GetBits() + poMask->GetBitsSize());
+    };
+    for (const char* pOptions : {"COMPRESS=JPEG LEVEL=30", "LAYOUT=COG COMPRESS=JPEG LEVEL=30"})
+    {
+        const auto oRun = RunConvert({lossless, lossy, "--options", pOptions});
+        ASSERT_EQ(oRun.code, 0) << oRun.errors;
+        EXPECT_NE(oRun.errors.find("a mask says which are valid"), std::string::npos) << oRun.errors;
+        EXPECT_EQ(Valid(lossy, {0, 0, 400, 300}), Valid(lossless, {0, 0, 400, 300}));
+    }
+    const auto poLossy = OpenFile(lossy, eReadOnly);
+    auto& oBitmaps = dynamic_cast<krv::datasources::IBitmapDataset&>(*poLossy);
+    const std::unique_ptr<krv::datasources::IOverviewManager> poMaskLevels(oBitmaps.GetBitmapOverviewManager());
+    ASSERT_EQ(poMaskLevels->GetLevels(), std::vector<unsigned int>{2});
+    const std::unique_ptr<krv::datasources::IRasterIO> poLevel(poMaskLevels->GetOverviewIO(2, {1}));
+    std::string bits(200 * 150, '\0');
+    poLevel->ReadWindow(0U, 0U, 200U, 150U, reinterpret_cast<unsigned char*>(bits.data()));
+    for (const unsigned int nX : {49U, 50U, 124U, 125U})
+        EXPECT_EQ(bits[70 * 200 + nX] != 0, nX < 50 || nX > 124) << nX;
+
+    // Blocks that move bring the values along; the levels that are built beside them want the mask all the same.
+    ASSERT_EQ(RunConvert({demo, out, "--options", "COMPRESS=JPEG"}).code, 0);
+    {
+        const auto poFile = OpenFile(out);
+        dynamic_cast<krv::datasources::IBitmapDataset&>(*poFile).DeleteBitmap(1);
+        auto oRecord = poFile->ReadAuxiliaryData();
+        oRecord.SetFileMetadataValue("NO_DATA_VALUE", "0");
+        poFile->WriteAuxiliaryData(oRecord);
+        poFile->Close();
+    }
+    const std::string moved = oFolder.File("moved.tif");
+    ASSERT_EQ(RunConvert({out, moved, "--options", "LAYOUT=COG COMPRESS=JPEG"}).errors, "");
+    EXPECT_EQ(Valid(moved, {0, 0, 400, 300}), Valid(out, {0, 0, 400, 300}));
+    const auto poOut = OpenFile(out, eReadOnly), poMoved = OpenFile(moved, eReadOnly);
+    EXPECT_EQ(DescribeDifference(dynamic_cast<krv::datasources::IEncodedBlocks&>(*poOut),
+                                 dynamic_cast<krv::datasources::IEncodedBlocks&>(*poMoved), 1),
+              "");
+    auto& oMoved = dynamic_cast<krv::datasources::IBitmapDataset&>(*poMoved);
+    EXPECT_EQ(std::unique_ptr<krv::datasources::IOverviewManager>(oMoved.GetBitmapOverviewManager())->GetLevels(),
+              std::vector<unsigned int>{2});
+
+    const auto oPart = RunConvert({lossy, out, "--window", "3,5,64,32"});
+    ASSERT_EQ(oPart.code, 0) << oPart.errors;
+    EXPECT_NE(oPart.errors.find("compression JPEG"), std::string::npos) << oPart.errors;
+    const std::unique_ptr<krv::gobs::Raster> poPart(BasicReader(lossy).ReadRaster(3, 5, 64, 32));
+    EXPECT_EQ(ReadPixels(BasicReader(out)), std::string(poPart->GetBuffer(), poPart->GetBuffer() + 64 * 32));
+    EXPECT_EQ(Valid(out, {0, 0, 64, 32}), Valid(lossy, {3, 5, 64, 32}));
 }
 
 // Display defaults get the numbers of the copy, references to the file's own table follow the copied table, and a

@@ -143,6 +143,12 @@ bool CopyPlan::IsCut() const
     return moWindow.width != oRaster.GetWidth() || moWindow.height != oRaster.GetHeight();
 }
 
+bool CopyPlan::AreTypesKept() const
+{
+    return std::all_of(moChannels.begin(), moChannels.end(),
+                       [](const CopiedChannel& oChannel) { return oChannel.from == oChannel.to; });
+}
+
 bool CopyPlan::IsWholeFile() const
 {
     unsigned int nNext = 0;

@@ -56,6 +56,8 @@ public:
     bool IsCut() const;
     // Whether values may change.
     bool IsLossy() const { return mbLossy; }
+    // Whether each channel keeps its type.
+    bool AreTypesKept() const;
     // Whether these are all channels of one file in its own order.
     bool IsWholeFile() const;
     std::vector<krv::gobs::DataType> GetTypes() const;

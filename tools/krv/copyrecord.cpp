@@ -144,9 +144,10 @@ MetadataMap FileRecord(const CopyPlan& oPlan)
 
 } // namespace
 
-AuxiliaryData MakeRecord(const CopyPlan& oPlan, const std::string& target, const TableNumbers& oTables)
+AuxiliaryData MakeRecord(const CopyPlan& oPlan, const std::string& target, const TableNumbers& oTables,
+                         bool bPixelsChange, bool bWithoutNoData)
 {
-    const bool bStale = oPlan.IsCut() || oPlan.IsLossy();
+    const bool bStale = oPlan.IsCut() || oPlan.IsLossy() || bPixelsChange;
     AuxiliaryData oRecord(static_cast<unsigned int>(oPlan.GetChannels().size()));
     std::vector<AuxiliaryData> oSources;
     for (std::size_t s = 0; s < oPlan.GetSourceCount(); ++s)
@@ -161,6 +162,8 @@ AuxiliaryData MakeRecord(const CopyPlan& oPlan, const std::string& target, const
         MetadataMap oMap = oSource.GetChanMetadata(oChannel.channel);
         if (bStale)
             DropStatistics(oMap);
+        if (bWithoutNoData)
+            oMap.erase(NO_DATA);
         RenumberTables(oMap, oChannel.source, oPlan.GetSource(oChannel.source).GetName(), target, oTables);
         oRecord.SetChanMetadata(oMap, nPosition);
         oRecord.SetChannelDescription(oSource.GetChannelDescription(oChannel.channel), nPosition);
@@ -170,7 +173,9 @@ AuxiliaryData MakeRecord(const CopyPlan& oPlan, const std::string& target, const
         MoveWithWindow(oFileMap, oPlan.GetWindow());
     if (bStale)
         DropStatistics(oFileMap);
-    if (oPlan.GetSourceCount() > 1)
+    if (bWithoutNoData)
+        oFileMap.erase(NO_DATA);
+    else if (oPlan.GetSourceCount() > 1)
         SpreadNoData(oPlan, oFileMap, oRecord);
     oRecord.SetFileMetadata(oFileMap);
     return oRecord;

@@ -17,8 +17,9 @@ using TableNumbers = std::map<std::pair<std::size_t, unsigned int>, unsigned int
 // value where the first file's does not hold for it. Display defaults get the numbers of the copied channels,
 // references to colour tables of the file itself those of the copied tables. Ground control points and rational
 // polynomials move with the window. Bookkeeping of levels stays behind, and so do statistics that no longer hold.
+// bPixelsChange: the copy is encoded with loss. bWithoutNoData: its values do not say which pixels are valid.
 krv::datasources::AuxiliaryData MakeRecord(const CopyPlan& oPlan, const std::string& target,
-                                           const TableNumbers& oTables);
+                                           const TableNumbers& oTables, bool bPixelsChange, bool bWithoutNoData);
 
 // The transform of an image that begins at a pixel of another one.
 krv::ogc::cs::GeocodingInfo ShiftGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo, unsigned int nX, unsigned int nY);

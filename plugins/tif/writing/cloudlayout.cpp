@@ -29,16 +29,20 @@ std::uint64_t GetPixels(const PageModel& oPage)
     return oPage.moTags.GetNumber(TIFFTAG_IMAGEWIDTH, 0) * oPage.moTags.GetNumber(TIFFTAG_IMAGELENGTH, 0);
 }
 
-// The image, its masks, and the levels from large to small.
-std::vector<Placed> Sort(const std::vector<std::shared_ptr<PageModel>>& oPages)
+std::vector<Placed> Place(const std::vector<std::shared_ptr<PageModel>>& oPages)
 {
-    std::vector<Placed> oSorted;
+    std::vector<Placed> oPlaced;
     for (const std::shared_ptr<PageModel>& poPage : oPages)
-        oSorted.push_back({*poPage, poPage.get(), {}, {}});
+        oPlaced.push_back({*poPage, poPage.get(), {}, {}});
+    return oPlaced;
+}
+
+// The image, its masks, and the levels from large to small.
+void Sort(std::vector<Placed>& oSorted)
+{
     std::stable_sort(oSorted.begin() + 1, oSorted.end(),
                      [](const Placed& oFirst, const Placed& oSecond)
                      { return GetPixels(oFirst.moPage) > GetPixels(oSecond.moPage); });
-    return oSorted;
 }
 
 void PlaceDirectory(Placed& oPlaced, const FileHeader& oHeader, std::uint64_t nBehind, support::Space& oSpace)
@@ -95,9 +99,11 @@ void WriteDirectory(const Placed& oPlaced, const FileHeader& oHeader, std::uint6
 } // namespace
 
 void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, const FileHeader& oHeader,
-                      const support::File& oSource, support::File& oTarget)
+                      const support::File& oSource, support::File& oTarget, bool bSorted)
 {
-    std::vector<Placed> oSorted = Sort(oPages);
+    std::vector<Placed> oSorted = Place(oPages);
+    if (bSorted)
+        Sort(oSorted);
     support::Space oSpace(oTarget.GetName(), oHeader.GetBytes(), oHeader.mbBigTiff ? INT64_MAX : UINT32_MAX,
                           "the file would pass the limit of 4 GiB of classic TIFF");
     for (Placed& oPlaced : oSorted)

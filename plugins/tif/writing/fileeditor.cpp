@@ -32,6 +32,8 @@ constexpr std::uint64_t MODEL_BYTES_PER_BYTE = 16;
 constexpr std::uint64_t STRILE_MODEL_BYTES = 3 * sizeof(std::uint64_t) + sizeof(std::uint32_t);
 constexpr std::uint64_t LONGEST_LOADED_TEXT = 4096;
 constexpr std::uint64_t MAXIMUM_TAG_BYTES = std::uint64_t{96} << 20;
+// A file up to this size costs little to be written twice.
+constexpr std::uint64_t SMALL_FILE = std::uint64_t{4} << 20;
 constexpr std::size_t COPY_BYTES = std::size_t{1} << 20;
 
 bool IsStrileTag(std::uint16_t nTag)
@@ -772,15 +774,27 @@ void FileEditor::Synchronize()
     mbNamed = true;
 }
 
-// A file that is to be laid out for a network gets its order at the very end: a second temporary file takes its place.
+// Whether a new, small file holds a good deal of what was given up again while it was made: directories above all.
+bool FileEditor::IsWasteful() const
+{
+    if (moTemporary.empty() || mpoFile->GetSize() > SMALL_FILE)
+        return false;
+    std::uint64_t nUsed = 0;
+    for (const Extent& oPiece : ListUsed())
+        nUsed += oPiece.mnBytes;
+    return mpoFile->GetSize() > nUsed + nUsed / 20;
+}
+
+// A file that is to be laid out for a network gets its order at the very end, and so does one that would be larger than
+// it need be: a second temporary file takes its place.
 void FileEditor::Finish()
 {
-    if (!moOptions.mbCloud || !HasPages())
-        return Synchronize();
     CheckWritable();
     StoreHeld();
-    if (IsChanged())
+    if (HasPages() && IsChanged())
         Commit(WriteDirectories());
+    if (!HasPages() || (!moOptions.mbCloud && !IsWasteful()))
+        return Synchronize();
     for (const std::shared_ptr<PageModel>& poPage : moPages)
         LoadTags(*poPage);
     // Only the file that has got the name is replaced by its better form.
@@ -791,7 +805,7 @@ void FileEditor::Finish()
     {
         support::File oTarget(laidOut, support::File::Mode::eCreate);
         oTarget.ShowAs(moFileName);
-        WriteCloudLayout(moPages, moHeader, *mpoFile, oTarget);
+        WriteCloudLayout(moPages, moHeader, *mpoFile, oTarget, moOptions.mbCloud);
         oTarget.Flush();
         oTarget.Rename(moFileName, mbNamed || mbReplaces);
     }

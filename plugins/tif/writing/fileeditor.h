@@ -128,6 +128,7 @@ private:
     void Adopt(const Written& oWritten);
     // pHeir: the page that takes its place, or null.
     void ReleasePage(const PageModel& oPage, const PageModel* pHeir);
+    bool IsWasteful() const;
     [[noreturn]] void Fail(const std::string& what, const Place& oPlace = Place::Current()) const;
 
     std::string moFileName;

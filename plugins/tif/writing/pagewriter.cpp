@@ -105,12 +105,7 @@ void PageWriter::Write(const support::BlockAddress& oBlock, const support::Pixel
     mpoEditor->CheckWritable();
     CheckPage();
     moEncoder.CheckWritable();
-    if (moOnChange)
-    {
-        const auto oCall = moOnChange;
-        oCall();
-        moOnChange = nullptr;
-    }
+    NoteChange();
     const support::PixelRect oRect = ToImage(oBlock, oPart);
     ForEach(oBlock.mnPlane, oRect,
             [&](const Strile& oStrile)
@@ -120,6 +115,15 @@ void PageWriter::Write(const support::BlockAddress& oBlock, const support::Pixel
                           pSource + (oShared.mnY - oRect.mnY) * nPitch + (oShared.mnX - oRect.mnX) * GetPixelBytes(),
                           nPitch);
             });
+}
+
+void PageWriter::NoteChange()
+{
+    if (!moOnChange)
+        return;
+    const auto oCall = moOnChange;
+    oCall();
+    moOnChange = nullptr;
 }
 
 void PageWriter::WritePart(const Strile& oStrile, const support::PixelRect& oPart, const unsigned char* pSource,
@@ -166,7 +170,7 @@ void PageWriter::Store(const Strile& oStrile, const unsigned char* pPixels, std:
 // The begin of what is replaced; of a strip or tile that is not stored yet that of the first one that is.
 std::span<const unsigned char> PageWriter::ReadForm(std::uint64_t nStrile)
 {
-    const std::vector<std::uint64_t>& oCounts = mpoModel->moByteCounts;
+    const auto& oCounts = mpoModel->moByteCounts;
     if (moEncoder.GetFormBytes() == 0)
         return {};
     if (oCounts[nStrile] == 0)
@@ -183,6 +187,16 @@ std::span<const unsigned char> PageWriter::ReadForm(std::uint64_t nStrile)
     moLike.resize(std::min<std::uint64_t>(oCounts[nStrile], moEncoder.GetFormBytes()));
     moLike.resize(mpoEditor->GetFile()->ReadUpTo(mpoModel->moOffsets[nStrile], moLike.data(), moLike.size()));
     return moLike;
+}
+
+void PageWriter::StoreCoded(std::uint64_t nStrile, const unsigned char* pBytes, std::size_t nBytes)
+{
+    mpoEditor->CheckWritable();
+    CheckPage();
+    NoteChange();
+    mpoEditor->StoreStrile(*mpoModel, nStrile, pBytes, nBytes);
+    Forget(nStrile);
+    moReader.Forget();
 }
 
 void PageWriter::ReadStored(const Strile& oStrile, unsigned char* pTarget, std::size_t nPitch)

@@ -36,6 +36,8 @@ public:
               std::size_t nPitch);
     void Write(const support::BlockAddress& oBlock, const support::PixelRect& oPart, const unsigned char* pSource,
                std::size_t nPitch);
+    // Takes the bytes of a strip or tile as they are.
+    void StoreCoded(std::uint64_t nStrile, const unsigned char* pBytes, std::size_t nBytes);
     bool Holds() const { return !moHeld.empty(); }
     // Stores what is held back, as long as the page is there.
     void Flush();
@@ -62,6 +64,7 @@ private:
     template <typename Action>
     void ForEach(unsigned int nPlane, const support::PixelRect& oRect, Action oAction) const;
     support::PixelRect ToImage(const support::BlockAddress& oBlock, const support::PixelRect& oPart) const;
+    void NoteChange();
     void WritePart(const Strile& oStrile, const support::PixelRect& oPart, const unsigned char* pSource,
                    std::size_t nPitch);
     void WriteInPlace(const Strile& oStrile, const support::PixelRect& oPart, const unsigned char* pSource,

@@ -2,6 +2,7 @@
 #include "datasources/interfaces/ichannelfilter.h"
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/iencodedblocks.h"
 #include "datasources/interfaces/iephemerisdataset.h"
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/interfaces/ifileiobuilder.h"
@@ -116,6 +117,9 @@ std::vector<Table> Tables()
         {"INewFileDataset", {Slot(&INewFileDataset::KeepExisting)}},
         {"IStorageDataset", {Slot(&IStorageDataset::GetUnusedBytes)}},
         {"IPagedDataset", {Slot(&IPagedDataset::CountFurtherImages)}},
+        {"IEncodedBlocks",
+         {Slot(&IEncodedBlocks::GetEncodedForm), Slot(&IEncodedBlocks::ReadEncoded),
+          Slot(&IEncodedBlocks::SetEncodedForm), Slot(&IEncodedBlocks::StoreEncoded)}},
         {"IHistoryIO",
          {Slot(&IHistoryIO::ReadHistory), Slot(&IHistoryIO::AppendHistory), Slot(&IHistoryIO::ClearHistory)}},
         {"IMathModelDataset",

@@ -206,6 +206,71 @@ TEST(TifCreate, OptionsAndTypesThatDoNotGoTogetherAreNamed)
     EXPECT_TRUE(ListFolder(oFolder.GetPath()).empty());
 }
 
+// Blocks go from file to file as they are when the form fits in every point; the rest is refused and changes nothing.
+TEST(TifCreate, BlocksAreTakenAsBytesInTheFormThatTheyHave)
+{
+    using krv::datasources::EncodedForm;
+    const TempFolder oFolder;
+    const Bytes oPixels = MakePixels(70, 50, 3, krv::gobs::eDT_16U, 5);
+    const TifPointer poFrom =
+        CreateTif(oFolder.File("a.tif"), "COMPRESS=LZW BLOCKXSIZE=32 BLOCKYSIZE=16 INTERLEAVE=BAND", 70, 50, 3,
+                  krv::gobs::eDT_16U);
+    WriteAll(*poFrom, oPixels); // blocks that are held back are handed out too
+    const EncodedForm oForm = poFrom->GetEncodedForm(1);
+    const std::string fileName = oFolder.File("b.tif");
+    const TifPointer poTo = CreateTif(fileName, "TILED=NO", 70, 50, 3, krv::gobs::eDT_16U);
+    const EncodedForm oOwn = poTo->GetEncodedForm(1);
+    const auto Changed = [&oForm](auto oChange)
+    {
+        EncodedForm oOther = oForm;
+        oChange(oOther);
+        return oOther;
+    };
+    for (const EncodedForm& oOther :
+         {Changed([](EncodedForm& o) { o.mnWidth = 71; }), Changed([](EncodedForm& o) { o.mnChannels = 2; }),
+          Changed([](EncodedForm& o) { o.moType = DataType(krv::gobs::eDT_16S); }),
+          Changed([](EncodedForm& o) { o.mbBigEndian = true; }), Changed([](EncodedForm& o) { o.mnSampleBits = 8; }),
+          Changed([](EncodedForm& o) { o.moCodec = "MAGIC"; }), Changed([](EncodedForm& o) { o.moCodec = "JPEG"; }),
+          Changed([](EncodedForm& o) { o.mnBlockHeight = 0; }),
+          Changed([](EncodedForm& o) { o.mbWholeBlocks = false; }), Changed([](EncodedForm& o) { o.mnPredictor = 9; }),
+          Changed([](EncodedForm& o) { o.moParameters["SPEED"] = "1"; }),
+          Changed(
+              [](EncodedForm& o) {
+                  o.moTables = {1, 2, 3};
+              })})
+    {
+        EXPECT_FALSE(poTo->SetEncodedForm(1, oOther));
+        EXPECT_TRUE(poTo->GetEncodedForm(1) == oOwn);
+    }
+    ASSERT_TRUE(poTo->SetEncodedForm(1, oForm));
+    std::vector<unsigned char> oBytes;
+    for (unsigned int nBlock = 0; nBlock < 3 * 3 * 4; ++nBlock)
+    {
+        const krv::datasources::BlockNumber oBlock{nBlock / 12, nBlock % 3, nBlock / 3 % 4};
+        EXPECT_FALSE(poTo->ReadEncoded(1, oBlock, oBytes)); // not stored yet
+        ASSERT_TRUE(poFrom->ReadEncoded(1, oBlock, oBytes));
+        poTo->StoreEncoded(1, oBlock, oBytes.data(), oBytes.size());
+    }
+    EXPECT_EQ(ReadAll(*poTo), oPixels);
+    EXPECT_THAT(Error([&] { poTo->SetEncodedForm(1, oForm); }), testing::HasSubstr("stored already"));
+    EXPECT_THAT(Error([&] { poTo->ReadEncoded(1, {0, 3, 0}, oBytes); }), testing::HasSubstr("no block 3, 0"));
+    EXPECT_THAT(Error([&] { poTo->GetEncodedForm(2); }), testing::HasSubstr("level 2 does not exist"));
+    const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poTo->GetOverviewManager());
+    poLevels->CreateLevel(2);
+    poLevels->SetValid(1, 2, true);
+    poTo->StoreEncoded(1, {0, 0, 0}, oBytes.data(), oBytes.size());
+    EXPECT_FALSE(poLevels->IsValid(1, 2));
+    poTo->StoreEncoded(2, {2, 1, 1}, oBytes.data(), oBytes.size()); // pixels of the level's own
+    ASSERT_TRUE(poFrom->ReadEncoded(1, {0, 0, 0}, oBytes));
+    poTo->StoreEncoded(1, {0, 0, 0}, oBytes.data(), oBytes.size());
+    poTo->Close();
+    const Judgement oJudgement = Judge(fileName);
+    EXPECT_EQ(oJudgement.moComplaints, "");
+    EXPECT_TRUE(oJudgement.moPixels == oPixels);
+    EXPECT_THAT(Error([&] { OpenTif(fileName)->StoreEncoded(1, {}, oBytes.data(), 1); }),
+                testing::HasSubstr("reading only"));
+}
+
 // The most memory that this process has had, in MiB.
 long PeakMemory()
 {
