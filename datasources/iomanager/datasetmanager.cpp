@@ -10,14 +10,15 @@
 #include "toolkit/nspio/warning.h"
 #include "toolkit/xml/xmlutil.h"
 
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
-#include <fstream>
 #include <mutex>
 
 namespace krv::datasources
@@ -44,23 +45,32 @@ struct ConstructingGuard
     ~ConstructingGuard() { sbConstructing = false; }
 };
 
-bool ReadHeaderByStream(const std::string& name, Header& oHeader, bool& bOpened)
+// A pipe or a device would wait for data while every other opening waits for this one, and some devices act when they
+// are opened.
+bool IsSpecial(const struct stat& oStatus)
 {
-    std::ifstream oStream;
-    oStream.rdbuf()->pubsetbuf(nullptr, 0);
-    oStream.open(name, std::ios::binary);
-    bOpened = oStream.is_open();
-    if (!bOpened)
-        return false;
-    oStream.read(reinterpret_cast<char*>(oHeader.data()), HEADER_LENGTH);
-    return !oStream.bad();
+    return !S_ISREG(oStatus.st_mode) && !S_ISBLK(oStatus.st_mode);
 }
 
-// A pipe or a device would wait for data while every other opening waits for this one.
 bool IsSpecialFile(const std::string& name)
 {
-    struct stat oStatus;
-    return stat(name.c_str(), &oStatus) == 0 && !S_ISREG(oStatus.st_mode) && !S_ISBLK(oStatus.st_mode);
+    struct stat oStatus = {};
+    return stat(name.c_str(), &oStatus) == 0 && IsSpecial(oStatus);
+}
+
+// As far as the header goes, or the file. The end of a plain file is known without asking for more.
+bool ReadHeader(int nFile, const struct stat& oStatus, Header& oHeader)
+{
+    for (std::size_t nDone = 0; nDone < HEADER_LENGTH;)
+    {
+        const ssize_t nRead = read(nFile, oHeader.data() + nDone, HEADER_LENGTH - nDone);
+        if (nRead < 0 && errno != EINTR)
+            return false;
+        nDone += static_cast<std::size_t>(std::max<ssize_t>(nRead, 0));
+        if (nRead == 0 || (S_ISREG(oStatus.st_mode) && static_cast<off_t>(nDone) >= oStatus.st_size))
+            break;
+    }
+    return true;
 }
 
 // An exception whose message is an empty text by contract. what() names the file and the cause, for programs that show
@@ -89,19 +99,14 @@ std::string WhyUnreadable(const std::string& name)
 
 bool ReadHeader(const std::string& name, Header& oHeader)
 {
-    if (IsSpecialFile(name))
+    struct stat oStatus = {};
+    if (stat(name.c_str(), &oStatus) != 0 || IsSpecial(oStatus))
         return false;
-    bool bOpened = false;
-    if (ReadHeaderByStream(name, oHeader, bOpened))
-        return true;
-    if (bOpened)
+    const int nFile = open(name.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC);
+    if (nFile < 0)
         return false;
-    std::FILE* const pFile = std::fopen(name.c_str(), "rb");
-    if (pFile == nullptr)
-        return false;
-    [[maybe_unused]] const std::size_t nRead = std::fread(oHeader.data(), 1, HEADER_LENGTH, pFile);
-    const bool bRead = std::ferror(pFile) == 0;
-    std::fclose(pFile);
+    const bool bRead = ReadHeader(nFile, oStatus, oHeader);
+    close(nFile);
     return bRead;
 }
 
@@ -228,12 +233,12 @@ IDataset* DatasetManager::OpenLocked(const std::string& fileName, AccessMode eMo
 {
     const std::string mungedName = IMPMunge(fileName);
     bool bRead = false;
-    for (const std::string& name : {fileName, mungedName})
+    for (const std::string* pName : {&fileName, &mungedName})
     {
         Header oHeader{};
-        bRead = ReadHeader(name, oHeader) || bRead;
+        bRead = ReadHeader(*pName, oHeader) || bRead;
         bool bFound = false;
-        IDataset* const poDataset = OpenRecognised(name, oHeader.data(), eMode, bFound);
+        IDataset* const poDataset = OpenRecognised(*pName, oHeader.data(), eMode, bFound);
         if (bFound)
             return poDataset;
     }

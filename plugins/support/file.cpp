@@ -182,7 +182,7 @@ File::File(const std::string& fileName, Mode eMode, const Place& oPlace) : moNam
         throw IOException(fileName, fileName + ": is being written by another program or dataset", oPlace);
     }
     // The size as of now: whoever had the lock may have changed it.
-    if (::fstat(mnDescriptor, &oStatus) != 0)
+    if (eMode != Mode::eRead && ::fstat(mnDescriptor, &oStatus) != 0)
         oStatus.st_size = 0;
     mnSize = static_cast<std::uint64_t>(oStatus.st_size);
     mbLinked = oStatus.st_nlink != 0;

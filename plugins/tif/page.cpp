@@ -1,5 +1,6 @@
 #include "plugins/tif/page.h"
 
+#include "plugins/tif/plaindirectory.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -20,13 +21,6 @@ constexpr std::uint64_t MAXIMUM_ROW_BYTES = std::uint64_t{96} << 20;
 std::uint32_t DivideUp(std::uint32_t nSize, std::uint32_t nPart)
 {
     return (nSize - 1) / nPart + 1;
-}
-
-template <typename T>
-T GetTag(TIFF* poTiff, std::uint32_t nTag, T nDefault)
-{
-    T nValue = nDefault;
-    return TIFFGetFieldDefaulted(poTiff, nTag, &nValue) == 1 ? nValue : nDefault;
 }
 
 bool IsStrileTag(std::uint16_t nTag)
@@ -120,10 +114,15 @@ bool PageForm::IsPremultiplied() const
                                 EXTRASAMPLE_ASSOCALPHA;
 }
 
-Page::Page(std::shared_ptr<const support::File> poFile, const FileHeader& oHeader, std::uint64_t nDirectory)
-    : mpoFile(std::move(poFile)), moHeader(oHeader), moReader(*mpoFile), moDirectory(moReader, oHeader, nDirectory),
-      moHandle(CheckDirectory(), oHeader, nDirectory)
+Page::Page(std::shared_ptr<const support::File> poFile, const FileHeader& oHeader, std::uint64_t nDirectory,
+           std::unique_ptr<PeekReader> poReader)
+    : mpoFile(std::move(poFile)), moHeader(oHeader),
+      mpoReader(poReader ? std::move(poReader) : std::make_unique<PeekReader>(*mpoFile)),
+      moDirectory(*mpoReader, oHeader, nDirectory)
 {
+    CheckTagSizes();
+    CheckNumbers();
+    mbPlain = IsPlainDirectory(moDirectory, *mpoReader);
     ReadForm();
     ReadGeometry();
     CheckCodec();
@@ -161,11 +160,20 @@ std::span<const unsigned char> Page::GetJpegTables() const
     return {static_cast<const unsigned char*>(pBytes), nBytes};
 }
 
-PeekReader& Page::CheckDirectory()
+TiffHandle& Page::GetHandle() const
 {
-    CheckTagSizes();
-    CheckNumbers();
-    return moReader;
+    if (!mpoHandle)
+        mpoHandle = std::make_unique<TiffHandle>(*mpoReader, moHeader, moDirectory.GetOffset());
+    return *mpoHandle;
+}
+
+template <typename T>
+T Page::GetTag(std::uint16_t nTag, T nDefault) const
+{
+    if (mbPlain)
+        return static_cast<T>(moDirectory.GetNumber(*mpoReader, nTag, nDefault));
+    T nValue = nDefault;
+    return TIFFGetFieldDefaulted(GetTiff(), nTag, &nValue) == 1 ? nValue : nDefault;
 }
 
 // libtiff reads every tag at once and bounds each alone only.
@@ -184,11 +192,11 @@ void Page::CheckTagSizes() const
 }
 
 // libtiff refuses these in words that tell a user nothing.
-void Page::CheckNumbers()
+void Page::CheckNumbers() const
 {
     const auto Number = [this](std::uint16_t nTag, std::uint64_t nDefault)
     {
-        return moDirectory.GetNumber(moReader, nTag, nDefault);
+        return moDirectory.GetNumber(*mpoReader, nTag, nDefault);
     };
     if (moDirectory.Find(TIFFTAG_IMAGEWIDTH) == nullptr || moDirectory.Find(TIFFTAG_IMAGELENGTH) == nullptr)
         Fail("the directory does not tell the image size");
@@ -201,8 +209,8 @@ void Page::CheckNumbers()
     const std::uint64_t nChannels = Number(TIFFTAG_SAMPLESPERPIXEL, 1);
     if (nChannels == 0 || nChannels > UINT16_MAX)
         Fail("the image has " + std::to_string(nChannels) + " channels");
-    const auto oBits = moDirectory.GetNumbers(moReader, TIFFTAG_BITSPERSAMPLE, nChannels);
-    const auto oFormats = moDirectory.GetNumbers(moReader, TIFFTAG_SAMPLEFORMAT, nChannels);
+    const auto oBits = moDirectory.GetNumbers(*mpoReader, TIFFTAG_BITSPERSAMPLE, nChannels);
+    const auto oFormats = moDirectory.GetNumbers(*mpoReader, TIFFTAG_SAMPLEFORMAT, nChannels);
     for (const auto* poValues : {&oBits, &oFormats})
         if (std::adjacent_find(poValues->begin(), poValues->end(), std::not_equal_to()) != poValues->end())
             Refuse("the channels differ in their type");
@@ -232,47 +240,45 @@ void Page::CheckRow(std::uint64_t nBytes) const
 
 void Page::ReadForm()
 {
-    TIFF* poTiff = GetTiff();
     moForm.mbBigEndian = moHeader.mbBigEndian;
-    moForm.mnChannels = GetTag<std::uint16_t>(poTiff, TIFFTAG_SAMPLESPERPIXEL, 1);
-    moForm.mbSeparate = moForm.mnChannels > 1 && GetTag<std::uint16_t>(poTiff, TIFFTAG_PLANARCONFIG,
-                                                                       PLANARCONFIG_CONTIG) == PLANARCONFIG_SEPARATE;
-    moForm.mbReversedBits = GetTag<std::uint16_t>(poTiff, TIFFTAG_FILLORDER, FILLORDER_MSB2LSB) == FILLORDER_LSB2MSB;
-    moForm.mnCompression = GetTag<std::uint16_t>(poTiff, TIFFTAG_COMPRESSION, COMPRESSION_NONE);
+    moForm.mnChannels = GetTag<std::uint16_t>(TIFFTAG_SAMPLESPERPIXEL, 1);
+    moForm.mbSeparate = moForm.mnChannels > 1 &&
+                        GetTag<std::uint16_t>(TIFFTAG_PLANARCONFIG, PLANARCONFIG_CONTIG) == PLANARCONFIG_SEPARATE;
+    moForm.mbReversedBits = GetTag<std::uint16_t>(TIFFTAG_FILLORDER, FILLORDER_MSB2LSB) == FILLORDER_LSB2MSB;
+    moForm.mnCompression = GetTag<std::uint16_t>(TIFFTAG_COMPRESSION, COMPRESSION_NONE);
     if (HasPredictor(moForm.mnCompression))
-        moForm.mnPredictor = GetTag<std::uint16_t>(poTiff, TIFFTAG_PREDICTOR, PREDICTOR_NONE);
-    moForm.mnPhotometric = GetTag<std::uint16_t>(poTiff, TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
+        moForm.mnPredictor = GetTag<std::uint16_t>(TIFFTAG_PREDICTOR, PREDICTOR_NONE);
+    moForm.mnPhotometric = GetTag<std::uint16_t>(TIFFTAG_PHOTOMETRIC, PHOTOMETRIC_MINISBLACK);
+    if (mbPlain)
+        for (const std::uint64_t nKind : moDirectory.GetNumbers(*mpoReader, TIFFTAG_EXTRASAMPLES, moForm.mnChannels))
+            moForm.moExtraSamples.push_back(static_cast<std::uint16_t>(nKind));
     std::uint16_t nExtra = 0;
     std::uint16_t* pExtra = nullptr;
-    if (TIFFGetField(poTiff, TIFFTAG_EXTRASAMPLES, &nExtra, &pExtra) == 1 && nExtra <= moForm.mnChannels)
+    if (!mbPlain && TIFFGetField(GetTiff(), TIFFTAG_EXTRASAMPLES, &nExtra, &pExtra) == 1 && nExtra <= moForm.mnChannels)
         moForm.moExtraSamples.assign(pExtra, pExtra + nExtra);
     std::string reason;
-    if (!FindSampleForm(GetTag<std::uint16_t>(poTiff, TIFFTAG_BITSPERSAMPLE, 1),
-                        GetTag<std::uint16_t>(poTiff, TIFFTAG_SAMPLEFORMAT, SAMPLEFORMAT_UINT), moForm.moSample,
-                        reason))
+    if (!FindSampleForm(GetTag<std::uint16_t>(TIFFTAG_BITSPERSAMPLE, 1),
+                        GetTag<std::uint16_t>(TIFFTAG_SAMPLEFORMAT, SAMPLEFORMAT_UINT), moForm.moSample, reason))
         Refuse(reason);
 }
 
 void Page::ReadGeometry()
 {
-    TIFF* poTiff = GetTiff();
-    moForm.mnWidth = GetTag<std::uint32_t>(poTiff, TIFFTAG_IMAGEWIDTH, 0);
-    moForm.mnHeight = GetTag<std::uint32_t>(poTiff, TIFFTAG_IMAGELENGTH, 0);
-    moForm.mbTiled = TIFFIsTiled(poTiff) != 0;
+    moForm.mnWidth = GetTag<std::uint32_t>(TIFFTAG_IMAGEWIDTH, 0);
+    moForm.mnHeight = GetTag<std::uint32_t>(TIFFTAG_IMAGELENGTH, 0);
+    moForm.mbTiled = mbPlain ? moDirectory.Find(TIFFTAG_TILEWIDTH) != nullptr : TIFFIsTiled(GetTiff()) != 0;
     CheckExtent("image", moForm.mnWidth, moForm.mnHeight);
-    if (GetTag<std::uint32_t>(poTiff, TIFFTAG_IMAGEDEPTH, 1) > 1 ||
-        GetTag<std::uint32_t>(poTiff, TIFFTAG_TILEDEPTH, 1) > 1)
+    if (GetTag<std::uint32_t>(TIFFTAG_IMAGEDEPTH, 1) > 1 || GetTag<std::uint32_t>(TIFFTAG_TILEDEPTH, 1) > 1)
         Refuse("volumes (image depth above 1)");
     if (moForm.mbTiled)
     {
-        moForm.mnStrileWidth = GetTag<std::uint32_t>(poTiff, TIFFTAG_TILEWIDTH, 0);
-        moForm.mnStrileHeight = GetTag<std::uint32_t>(poTiff, TIFFTAG_TILELENGTH, 0);
+        moForm.mnStrileWidth = GetTag<std::uint32_t>(TIFFTAG_TILEWIDTH, 0);
+        moForm.mnStrileHeight = GetTag<std::uint32_t>(TIFFTAG_TILELENGTH, 0);
     }
     else
     {
         moForm.mnStrileWidth = moForm.mnWidth;
-        moForm.mnStrileHeight =
-            std::min(moForm.mnHeight, GetTag<std::uint32_t>(poTiff, TIFFTAG_ROWSPERSTRIP, UINT32_MAX));
+        moForm.mnStrileHeight = std::min(moForm.mnHeight, GetTag<std::uint32_t>(TIFFTAG_ROWSPERSTRIP, UINT32_MAX));
     }
     CheckExtent(moForm.mbTiled ? "tile" : "strip", moForm.mnStrileWidth, moForm.mnStrileHeight);
     moForm.mnStrilesAcross = DivideUp(moForm.mnWidth, moForm.mnStrileWidth);
@@ -346,8 +352,8 @@ void Page::CheckSizes() const
     // The smallest part that is handled as a whole: a tile, or a row of a strip.
     CheckRow(std::max(moForm.GetRowBytes(moForm.mnStrileWidth), moForm.GetStoredRowBytes(moForm.mnStrileWidth)));
     if (moForm.GetStriles() > UINT32_MAX)
-        Refuse("there are too many strips or tiles");
-    if (moForm.mnCompression == COMPRESSION_NONE)
+        Fail("there are too many strips or tiles");
+    if (moForm.mnCompression == COMPRESSION_NONE || mbPlain)
         return;
     const std::uint64_t nExpected = moForm.GetStoredRowBytes(moForm.mnStrileWidth);
     const auto nClaimed = moForm.mbTiled ? TIFFTileRowSize64(GetTiff()) : TIFFScanlineSize64(GetTiff());

@@ -60,12 +60,15 @@ struct PageForm
     bool IsPremultiplied() const;
 };
 
-// One directory of the file with everything that reading it takes. Throws FileFormatException naming file and cause for
-// what is damaged and for what cannot be read correctly.
+// One directory of the file with everything that reading it takes. libtiff looks at a plain directory only when
+// something is asked that it alone knows. Throws FileFormatException naming file and cause for what is damaged and for
+// what cannot be read correctly.
 class Page
 {
 public:
-    Page(std::shared_ptr<const support::File> poFile, const FileHeader& oHeader, std::uint64_t nDirectory);
+    // poReader: of the same file, with what was read of it already; null for a new one.
+    Page(std::shared_ptr<const support::File> poFile, const FileHeader& oHeader, std::uint64_t nDirectory,
+         std::unique_ptr<PeekReader> poReader = nullptr);
     ~Page();
     Page(const Page&) = delete;
     Page& operator=(const Page&) = delete;
@@ -75,9 +78,9 @@ public:
     const FileHeader& GetHeader() const { return moHeader; }
     const PageForm& GetForm() const { return moForm; }
     const RawDirectory& GetDirectory() const { return moDirectory; }
-    PeekReader& GetReader() { return moReader; }
-    TIFF* GetTiff() const { return moHandle.Get(); }
-    TiffHandle& GetHandle() { return moHandle; }
+    PeekReader& GetReader() { return *mpoReader; }
+    TIFF* GetTiff() const { return GetHandle().Get(); }
+    TiffHandle& GetHandle() const;
     // Of tag 347, as long as the page is there; none when there is none.
     std::span<const unsigned char> GetJpegTables() const;
     StrileTable& GetStriles() { return *mpoStriles; }
@@ -91,9 +94,10 @@ public:
                            const Place& oPlace = Place::Current()) const;
 
 private:
-    PeekReader& CheckDirectory();
+    template <typename T>
+    T GetTag(std::uint16_t nTag, T nDefault) const;
     void CheckTagSizes() const;
-    void CheckNumbers();
+    void CheckNumbers() const;
     void CheckExtent(const char* pWhat, std::uint64_t nWidth, std::uint64_t nHeight) const;
     void CheckRow(std::uint64_t nBytes) const;
     void ReadForm();
@@ -105,9 +109,10 @@ private:
 
     std::shared_ptr<const support::File> mpoFile;
     FileHeader moHeader;
-    PeekReader moReader;
+    std::unique_ptr<PeekReader> mpoReader;
     RawDirectory moDirectory;
-    TiffHandle moHandle;
+    bool mbPlain = false;
+    mutable std::unique_ptr<TiffHandle> mpoHandle;
     PageForm moForm;
     std::unique_ptr<StrileTable> mpoStriles;
 };

@@ -23,6 +23,9 @@ public:
     // Returns how many bytes there were: fewer only at the end of the file. Throws IOException.
     std::size_t Read(std::uint64_t nOffset, void* pTarget, std::size_t nBytes);
 
+    // What is read from now on is read from the file anew.
+    void Forget() { maWindows[0].mnBytes = maWindows[1].mnBytes = 0; }
+
 private:
     static constexpr std::size_t WINDOW_BYTES = 4096;
 

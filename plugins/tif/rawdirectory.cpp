@@ -141,8 +141,13 @@ const DirectoryEntry* RawDirectory::Find(std::uint16_t nTag) const
 
 std::uint64_t RawDirectory::GetNumber(PeekReader& oReader, std::uint16_t nTag, std::uint64_t nDefault) const
 {
-    const auto oNumbers = GetNumbers(oReader, nTag, 1);
-    return oNumbers.empty() ? nDefault : oNumbers.front();
+    const DirectoryEntry* pEntry = Find(nTag);
+    if (pEntry == nullptr || pEntry->mnCount == 0 || !IsWholeType(pEntry->mnType))
+        return nDefault;
+    unsigned char aValue[8];
+    const std::size_t nBytes = GetTypeBytes(pEntry->mnType);
+    return oReader.Read(pEntry->mnOffset, aValue, nBytes) == nBytes ? ReadNumber(aValue, nBytes, moHeader.mbBigEndian)
+                                                                    : nDefault;
 }
 
 std::vector<std::uint64_t> RawDirectory::GetNumbers(PeekReader& oReader, std::uint16_t nTag, std::size_t nLimit) const

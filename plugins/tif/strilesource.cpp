@@ -243,6 +243,10 @@ void StrileSource::ReadCoded(const Piece& oPiece, const Strile& oStrile)
     const std::uint64_t nSize = mpoPage->GetFile().GetSize();
     if (oStrile.mnOffset >= nSize)
         mpoPage->Fail(moDecoder.Describe(oPiece.mnStrile) + ": the file is truncated: it lies behind the end");
+    if (oStrile.mbBytesKnown && oStrile.mnBytes > nSize - oStrile.mnOffset)
+        mpoPage->Fail(moDecoder.Describe(oPiece.mnStrile) + ": the file is truncated: it holds " +
+                      std::to_string(oStrile.mnBytes) + " bytes, " + std::to_string(nSize - oStrile.mnOffset) +
+                      " are there");
     // No coding makes data several times as long: more than that is not read.
     const std::uint64_t nStored = std::uint64_t{moForm.mnStrileHeight} * moForm.GetStoredRowBytes(moForm.mnStrileWidth);
     const std::uint64_t nMost = std::min<std::uint64_t>(nStored + nStored / 8 + AHEAD_BYTES, nSize - oStrile.mnOffset);

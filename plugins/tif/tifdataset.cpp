@@ -30,10 +30,12 @@ namespace krv::plugins::tif
 namespace
 {
 
-FileHeader ReadHeader(const support::File& oFile)
+FileHeader ReadHeader(PeekReader& oReader)
 {
+    const support::File& oFile = oReader.GetFile();
     unsigned char aHeader[FileHeader::BYTES] = {};
-    const std::size_t nBytes = oFile.ReadUpTo(0, aHeader, sizeof(aHeader));
+    oReader.Forget();
+    const std::size_t nBytes = oReader.Read(0, aHeader, sizeof(aHeader));
     const std::optional<FileHeader> oHeader = FileHeader::Parse(aHeader, nBytes);
     if (!oHeader)
         throw FileFormatException(oFile.GetName(), oFile.GetName() + ": is no TIFF file");
@@ -82,15 +84,16 @@ TifDataset::TifDataset(const std::string& fileName, krv::datasources::IFileForma
     : Dataset(fileName, poFormat)
 {
     const auto poFile = std::make_shared<support::File>(fileName, support::File::Mode::eRead);
+    auto poReader = std::make_unique<PeekReader>(*poFile);
     FileHeader oHeader;
     const auto ReadRoot = [&]
     {
-        oHeader = ReadHeader(*poFile);
+        oHeader = ReadHeader(*poReader);
         return oHeader.mnFirstDirectory;
     };
     support::HoldRoot(*poFile, ReadRoot);
     mpoFile = poFile;
-    mpoPage = std::make_shared<Page>(mpoFile, oHeader, oHeader.mnFirstDirectory);
+    mpoPage = std::make_shared<Page>(mpoFile, oHeader, oHeader.mnFirstDirectory, std::move(poReader));
     SetImage(MakePageSource(mpoPage, PixelUse::eImage));
 }
 

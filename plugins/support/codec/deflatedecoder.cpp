@@ -94,7 +94,7 @@ Result Inflate(const unsigned char* input, std::size_t nInput, unsigned char* ou
 
 } // namespace
 
-DeflateDecoder::DeflateDecoder() : mpoState(std::make_unique<State>()) {}
+DeflateDecoder::DeflateDecoder() = default;
 DeflateDecoder::~DeflateDecoder() = default;
 DeflateDecoder::DeflateDecoder(DeflateDecoder&&) noexcept = default;
 DeflateDecoder& DeflateDecoder::operator=(DeflateDecoder&&) noexcept = default;
@@ -102,6 +102,8 @@ DeflateDecoder& DeflateDecoder::operator=(DeflateDecoder&&) noexcept = default;
 Result DeflateDecoder::Decode(const unsigned char* input, std::size_t nInput, unsigned char* output,
                               std::size_t nOutput)
 {
+    if (!mpoState)
+        mpoState = std::make_unique<State>();
     if (mpoState->mpoDecompressor != nullptr)
     {
         std::size_t nBytes = 0;

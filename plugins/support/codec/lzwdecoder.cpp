@@ -324,7 +324,7 @@ struct LzwDecoder::Table
     }
 };
 
-LzwDecoder::LzwDecoder() : mpoTable(std::make_unique<Table>()) {}
+LzwDecoder::LzwDecoder() = default;
 LzwDecoder::~LzwDecoder() = default;
 LzwDecoder::LzwDecoder(LzwDecoder&&) noexcept = default;
 LzwDecoder& LzwDecoder::operator=(LzwDecoder&&) noexcept = default;
@@ -336,6 +336,8 @@ bool LzwDecoder::IsOldStyle(const unsigned char* input, std::size_t nInput)
 
 Result LzwDecoder::Decode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput)
 {
+    if (!mpoTable)
+        mpoTable = std::make_unique<Table>();
     if (IsOldStyle(input, nInput))
         return LzwRun<true>(mpoTable->maEntries, input, nInput, output, nOutput).Decode();
     return LzwRun<false>(mpoTable->maEntries, input, nInput, output, nOutput).Decode();

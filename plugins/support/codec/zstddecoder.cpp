@@ -58,13 +58,15 @@ Result DecodeStream(ZSTD_DCtx* context, const unsigned char* input, std::size_t 
 
 } // namespace
 
-ZstdDecoder::ZstdDecoder() : mpoState(std::make_unique<State>()) {}
+ZstdDecoder::ZstdDecoder() = default;
 ZstdDecoder::~ZstdDecoder() = default;
 ZstdDecoder::ZstdDecoder(ZstdDecoder&&) noexcept = default;
 ZstdDecoder& ZstdDecoder::operator=(ZstdDecoder&&) noexcept = default;
 
 Result ZstdDecoder::Decode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput)
 {
+    if (!mpoState)
+        mpoState = std::make_unique<State>();
     ZSTD_DCtx* context = mpoState->mpoContext;
     if (context == nullptr)
         return {Status::eNoMemory, 0};

@@ -684,6 +684,7 @@ std::shared_ptr<Page> FileEditor::OpenPage(const std::shared_ptr<PageModel>& poP
         oForm.mnChannels != oSummary.mnChannels || oForm.moSample.GetBits() != oSummary.mnBits ||
         oForm.mbTiled != poPage->IsTiled() || oForm.GetStriles() != poPage->GetStriles())
         Fail("a directory contradicts itself about the size of the image; it cannot be updated");
+    poOpened->GetHandle(); // now: the room of a directory is used again when the page changes
     poOpened->GetStriles().Use(poPage);
     return poOpened;
 }

@@ -263,6 +263,61 @@ unsigned int ChangePixelBytes(const std::string& fileName, unsigned int nTries)
     return nRefused;
 }
 
+// A changed directory is refused, or read as libtiff reads it.
+TEST(TifHostile, DirectoriesSayTheSameHereAndToLibtiff)
+{
+    const TempFolder oFolder;
+    const std::string file = oFolder.File("file.tif");
+    unsigned int nRead = 0;
+    std::mt19937 oRandom(5);
+    for (const Recipe& oRecipe : RECIPES)
+    {
+        std::filesystem::remove(file);
+        MakeFile(file, oRecipe);
+        const Bytes oSound = ReadBytes(file);
+        const krv::plugins::support::File oBytes(file, krv::plugins::support::File::Mode::eRead);
+        krv::plugins::tif::PeekReader oReader(oBytes);
+        const auto oHeader = krv::plugins::tif::FileHeader::Parse(oSound.data(), oSound.size());
+        const krv::plugins::tif::RawDirectory oDirectory(oReader, *oHeader, oHeader->mnFirstDirectory);
+        const std::size_t nBytes = 8 + oDirectory.GetEntries().size() * (oHeader->mbBigTiff ? 20 : 12);
+        const std::string changed = oFolder.File("changed.tif");
+        for (int nTry = 0; nTry < 100; ++nTry)
+        {
+            Bytes oChanged = oSound;
+            const std::size_t nAt = oHeader->mnFirstDirectory + oRandom() % nBytes;
+            oChanged[nAt] = static_cast<unsigned char>(oRandom() % 2 == 0 ? oRandom() : oRandom() % 8);
+            WriteBytes(changed, oChanged);
+            SCOPED_TRACE(std::to_string(oRecipe.compression) + ", byte " + std::to_string(nAt));
+            TifPointer poFile;
+            Bytes oPixels;
+            try
+            {
+                poFile = OpenTif(changed);
+                if (std::uint64_t{poFile->GetWidth()} * poFile->GetHeight() * poFile->GetChanCount() > 1000000)
+                    continue;
+                oPixels = ReadAll(*poFile);
+            }
+            catch (const krv::Exception&)
+            {
+                continue;
+            }
+            const Judgement oJudgement = Judge(changed);
+            EXPECT_FALSE(oJudgement.moComplaints.starts_with("cannot be opened")) << oJudgement.moComplaints;
+            EXPECT_EQ(oJudgement.mnWidth, poFile->GetWidth());
+            EXPECT_EQ(oJudgement.mnHeight, poFile->GetHeight());
+            EXPECT_EQ(oJudgement.mnChannels, poFile->GetChanCount());
+            // Of deflated strips that are too long libtiff gives a part; several channels of single bits are not
+            // placed.
+            const bool bJudged = oJudgement.moComplaints.empty() && oPixels.size() == oJudgement.moPixels.size() &&
+                                 oRecipe.compression != COMPRESSION_NONE &&
+                                 oRecipe.compression != COMPRESSION_ADOBE_DEFLATE;
+            EXPECT_TRUE(!bJudged || oPixels == oJudgement.moPixels);
+            ++nRead;
+        }
+    }
+    EXPECT_GT(nRead, 200u);
+}
+
 TEST(TifHostile, DamageThatLibtiffSeesIsSeen)
 {
     const TempFolder oFolder;
