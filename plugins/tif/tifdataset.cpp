@@ -567,6 +567,8 @@ unsigned int TifDataset::CreateBitmap()
     const Place oPlace = Place::Current();
     FileEditor& oEditor = GetEditor("bitmaps cannot be added", oPlace);
     const std::vector<unsigned int> oList = GetBitmapList();
+    if (!oList.empty() && oList.back() == UINT_MAX)
+        Refuse("the numbers of bitmaps are used up", oPlace);
     const unsigned int nBitmap = oList.empty() ? 1 : oList.back() + 1;
     Edit([&] { AddPage(MakeBitmapPage(*oEditor.GetPages().front(), nBitmap), oPlace); });
     return nBitmap;
@@ -586,6 +588,8 @@ void TifDataset::SetBitmapDescription(unsigned int nBitmap, const std::string& o
     FileEditor& oEditor = GetEditor("bitmaps cannot be written", oPlace);
     const unsigned int nMask = GetLevelBitmap();
     const std::uint64_t nPage = GetMask(nBitmap, oPlace).mnOffset;
+    if (oDescription.find('\0') != std::string::npos)
+        Refuse("a description with a NUL in it cannot be stored", oPlace);
     const std::vector<PageLevel> oLevels = GetPages().moMaskLevels;
     bool bOther = false;
     Edit(

@@ -795,7 +795,13 @@ void FileEditor::Finish()
     if (HasPages() && IsChanged())
         Commit(WriteDirectories());
     if (!HasPages() || (!moOptions.mbCloud && !IsWasteful()))
-        return Synchronize();
+    {
+        Synchronize();
+        // What was written to look at the file since then is of no more use.
+        if (HasPages())
+            mpoFile->CutBack(mnCommittedSize);
+        return;
+    }
     for (const std::shared_ptr<PageModel>& poPage : moPages)
         LoadTags(*poPage);
     // Only the file that has got the name is replaced by its better form.
