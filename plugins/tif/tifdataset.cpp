@@ -47,6 +47,24 @@ const std::string INVALID = "invalid";
 // What of a mask page's record is not the bitmap's own.
 constexpr const char* MASK_KEYS[] = {"ImageDescription", "Photometric", "PageName"};
 
+// In which other programs say how they made the levels.
+constexpr const char* FOREIGN_METHOD_KEY = "IMAGE_STRUCTURE:OVERVIEW_RESAMPLING";
+
+std::string ToUpper(std::string text)
+{
+    for (char& nCharacter : text)
+        nCharacter = static_cast<char>(std::toupper(static_cast<unsigned char>(nCharacter)));
+    return text;
+}
+
+// name: in capitals.
+bool IsResamplingName(std::string_view name)
+{
+    constexpr std::string_view NAMES[] = {"NEAREST", "AVERAGE", "MODE", "BILINEAR", "CUBIC",
+                                          "LANCZOS", "RMS",     "MIN",  "MAX",      "NONE"};
+    return std::find(std::begin(NAMES), std::end(NAMES), name) != std::end(NAMES);
+}
+
 std::string BookKey(unsigned int nLevel)
 {
     return "_Overview_" + std::to_string(nLevel);
@@ -847,6 +865,8 @@ void TifDataset::SetLevelValid(unsigned int nChannel, unsigned int nLevel, bool 
     krv::datasources::AuxiliaryData oBook = GetBook(eUse);
     const std::string method = moResampling.empty() ? std::string() : " " + moResampling;
     oBook.SetChanMetadataValue(BookKey(nLevel), (bValid ? VALID : INVALID) + method, nChannel);
+    if (!moResampling.empty() && !oBook.GetFileMetadataValue(FOREIGN_METHOD_KEY).empty())
+        oBook.SetFileMetadataValue(FOREIGN_METHOD_KEY, moResampling);
     WriteBook(oBook, eUse, oPlace);
     if (eUse == PixelUse::eImage && bValid)
         WatchImage();
@@ -885,20 +905,20 @@ std::string TifDataset::GetResamplingName(PixelUse eUse) const
 {
     if (!moResampling.empty() || GetLevels(eUse).empty())
         return moResampling;
-    const std::string state = GetBook(eUse).GetChanMetadataValue(BookKey(GetLevels(eUse).front().mnLevel), 1);
+    const krv::datasources::AuxiliaryData& oBook = GetBook(eUse);
+    const std::string state = oBook.GetChanMetadataValue(BookKey(GetLevels(eUse).front().mnLevel), 1);
     const std::size_t nBlank = state.find(' ');
-    return nBlank == std::string::npos ? std::string() : state.substr(nBlank + 1);
+    if (nBlank != std::string::npos)
+        return state.substr(nBlank + 1);
+    const std::string method = ToUpper(oBook.GetFileMetadataValue(FOREIGN_METHOD_KEY));
+    return IsResamplingName(method) ? method : std::string();
 }
 
 void TifDataset::SetResamplingName(const std::string& name, const Place& oPlace)
 {
     GetEditor("overviews cannot be written", oPlace);
-    std::string upper = name;
-    for (char& nCharacter : upper)
-        nCharacter = static_cast<char>(std::toupper(static_cast<unsigned char>(nCharacter)));
-    const std::string_view oNames[] = {"NEAREST", "AVERAGE", "MODE", "BILINEAR", "CUBIC",
-                                       "LANCZOS", "RMS",     "MIN",  "MAX",      "NONE"};
-    if (std::find(std::begin(oNames), std::end(oNames), upper) == std::end(oNames))
+    const std::string upper = ToUpper(name);
+    if (!IsResamplingName(upper))
         throw ParameterException("The resampling method " + name + " is not known", ParameterException::eInvalidValue,
                                  "name", oPlace);
     moResampling = upper;

@@ -111,7 +111,8 @@ public:
     krv::datasources::AuxiliaryData ReadPageMetadata(std::uint64_t nDirectory) const;
 
     // For the overview managers: making levels, and the state of each as the channels' tag "_Overview_<level>" has it:
-    // "valid" or "invalid", a blank and the resampling method when it is known. Without a tag a level is valid.
+    // "valid" or "invalid", a blank and the resampling method when it is known. Without a tag a level is valid, and its
+    // method is what other programs say of all levels in the file's tag "IMAGE_STRUCTURE:OVERVIEW_RESAMPLING".
     void CreateLevel(unsigned int nLevel, PixelUse eUse, const Place& oPlace);
     void DeleteLevel(unsigned int nLevel, PixelUse eUse, const Place& oPlace);
     bool IsLevelValid(unsigned int nChannel, unsigned int nLevel, PixelUse eUse) const;

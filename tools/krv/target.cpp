@@ -1,6 +1,7 @@
 #include "tools/krv/target.h"
 
 #include "datasources/interfaces/ifileformat.h"
+#include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/iomanager/formatcapabilities.h"
 #include "toolkit/nspio/warning.h"
@@ -71,7 +72,8 @@ void Target::Warn(const std::string& message)
     krv::nspio::Warning::Warn(message, "tools/krv/conversion", 0);
 }
 
-Target::Target(const CopyPlan& oPlan, const TargetForm& oForm) : moName(oForm.name), moFormat(ChooseFormat(oForm))
+Target::Target(const CopyPlan& oPlan, const TargetForm& oForm)
+    : moName(oForm.name), moFormat(ChooseFormat(oForm)), mbNew(!std::filesystem::exists(oForm.name))
 {
     if (const auto oMoved = FindMovedForm(oPlan, oForm.options))
     {
@@ -93,6 +95,9 @@ void Target::Make(const CopyPlan& oPlan, const std::string& options)
 {
     mpoDataset.reset(); // the one before goes first: both have the same name
     mpoDataset.reset(DatasetManager::GetInstance()->NewDataset(moName, moFormat, options));
+    // A file that another program makes meanwhile is not replaced.
+    if (auto* const poNew = Find<INewFileDataset>(); poNew != nullptr && mbNew)
+        poNew->KeepExisting();
     mpoRaster = dynamic_cast<IRasterDataset*>(mpoDataset.get());
     if (mpoRaster == nullptr)
         throw krv::DataException(moName + ": the format does not hold images");

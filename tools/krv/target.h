@@ -56,6 +56,7 @@ private:
 
     std::string moName;
     std::string moFormat;
+    bool mbNew; // nothing had the name before
     std::unique_ptr<krv::datasources::IDataset> mpoDataset;
     krv::datasources::IRasterDataset* mpoRaster = nullptr;
     bool mbTakesBlocks = false;

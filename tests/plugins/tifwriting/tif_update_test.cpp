@@ -505,11 +505,18 @@ TEST(TifUpdate, LevelsAreMadeWrittenMarkedAndDeleted)
     WriteAll(*IOPointer(poLevels->GetOverviewIO(4, {1, 2})), 4, oPixels);
     poLevels->SetValid(1, 4, true);
     poLevels->SetValid(2, 4, true);
-    poDataset->WriteAuxiliaryData(AuxiliaryData(2));
+    const std::string method = "IMAGE_STRUCTURE:OVERVIEW_RESAMPLING"; // as other programs write it
+    AuxiliaryData oRecord(2);
+    oRecord.SetFileMetadataValue(method, "Bilinear");
+    poDataset->WriteAuxiliaryData(oRecord);
     poDataset->Close();
 
     poDataset = OpenTif(fileName, eUpdate);
     poLevels.reset(poDataset->GetOverviewManager());
+    EXPECT_EQ(poLevels->GetResamplingName(), "BILINEAR") << "the first level has no method of its own";
+    poLevels->SetResamplingName("mode");
+    poLevels->SetValid(1, 64, true);
+    EXPECT_EQ(poDataset->ReadAuxiliaryData().GetFileMetadataValue(method), "MODE");
     EXPECT_EQ(poLevels->GetLevels(), (std::vector<unsigned int>{2, 4, 51, 64}));
     EXPECT_EQ(poLevels->GetLevelWidth(4), 26u);
     EXPECT_EQ(poLevels->GetLevelHeight(4), 2u);
