@@ -235,6 +235,10 @@ void FileEditor::ReadPage(std::uint64_t nOffset, bool bBelowFirst, std::uint64_t
         Tag oTag{oEntry.mnTag, oEntry.mnType, oEntry.mnCount, {}, {}};
         if (GetTypeBytes(oEntry.mnType) == 0 || oEntry.GetBytes() > MAXIMUM_TAG_BYTES)
             Fail("tag " + std::to_string(oEntry.mnTag) + " is of an unknown type or size; the file cannot be updated");
+        // What is added to the file would become the values that it lacks.
+        const std::uint64_t nSize = mpoFile->GetSize();
+        if (oEntry.GetBytes() > nWord && (oEntry.mnOffset > nSize || oEntry.GetBytes() > nSize - oEntry.mnOffset))
+            Fail("the file is truncated: tag " + std::to_string(oEntry.mnTag) + " lies behind its end");
         if (oEntry.GetBytes() > nWord)
             oTag.moStored = {oEntry.mnOffset, oEntry.GetBytes(), 0};
         else
@@ -321,8 +325,6 @@ void FileEditor::Load(Tag& oTag)
 {
     if (!oTag.moBytes.empty() || oTag.mnCount == 0)
         return;
-    if (oTag.moStored.mnOffset > mpoFile->GetSize() || oTag.GetBytes() > mpoFile->GetSize() - oTag.moStored.mnOffset)
-        Fail("the file is truncated: tag " + std::to_string(oTag.mnTag) + " lies behind its end");
     Charge(oTag.GetBytes());
     oTag.moBytes.resize(oTag.GetBytes());
     mpoFile->Read(oTag.moStored.mnOffset, oTag.moBytes.data(), oTag.moBytes.size());

@@ -618,6 +618,12 @@ TEST(TifPaths, DirectoriesThatContradictThemselvesDoNoHarm)
             poDataset->Close();
             EXPECT_TRUE(Judge(fileName).moPixels == Bytes(2400, 3)) << nTag;
         }
+    // Values behind the end: what an update adds would be taken for them.
+    Handmade oShort = Handmade::Image(16, 16, 16, 1, 1, 1000, 256);
+    oShort.Add(65000, 2, 100, 2950);
+    WriteBytes(fileName, oShort.Finish(0, 3000));
+    EXPECT_NO_THROW(OpenTif(fileName));
+    EXPECT_THROW(OpenTif(fileName, eUpdate), krv::FileFormatException);
     // Strips beside tiles: readers take the tiles.
     Handmade oBoth = Handmade::Image(16, 16, 16, 1, 1, 1000, 256);
     for (const auto& [nNumber, nValue] : {std::pair(322, 16), {323, 16}, {324, 2000}, {325, 256}})
