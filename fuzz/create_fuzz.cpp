@@ -3,8 +3,6 @@
 #include "fuzz/support/edits.h"
 #include "plugins/tif/tifbuilder.h"
 #include "toolkit/exceptions/exceptions.h"
-#include "toolkit/nspio/warning.h"
-#include "toolkit/xml/xmlutil.h"
 
 #include <filesystem>
 
@@ -44,13 +42,6 @@ std::string PickOptions(FuzzedDataProvider& oProgram)
 }
 
 } // namespace
-
-extern "C" int LLVMFuzzerInitialize(int*, char***)
-{
-    krv::nspio::Warning::SetSink([](const std::string&, const std::string&, unsigned int) {});
-    KRV_XMLUtil::Initialize(); // else every reading of tag 42112 starts it anew
-    return 0;
-}
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* pBytes, std::size_t nBytes)
 {

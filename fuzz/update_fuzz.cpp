@@ -5,8 +5,6 @@
 #include "plugins/tif/pagelist.h"
 #include "plugins/tif/rawdirectory.h"
 #include "toolkit/exceptions/exceptions.h"
-#include "toolkit/nspio/warning.h"
-#include "toolkit/xml/xmlutil.h"
 
 #include <algorithm>
 
@@ -37,13 +35,6 @@ bool IsLossy(const std::string& fileName)
 }
 
 } // namespace
-
-extern "C" int LLVMFuzzerInitialize(int*, char***)
-{
-    krv::nspio::Warning::SetSink([](const std::string&, const std::string&, unsigned int) {});
-    KRV_XMLUtil::Initialize(); // else every reading of tag 42112 starts it anew
-    return 0;
-}
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* pBytes, std::size_t nBytes)
 {

@@ -7,7 +7,9 @@
 #include "gobs/raster/rasterinfo.h"
 #include "plugins/tif/tifbuilder.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/crsfactory.h"
+#include "toolkit/xml/xmlutil.h"
 
 #include <algorithm>
 #include <cstdio>
@@ -654,3 +656,11 @@ void Edits::Run(TifPointer poDataset)
 }
 
 } // namespace krv::fuzz
+
+// Of every fuzzer that edits files.
+extern "C" int LLVMFuzzerInitialize(int*, char***)
+{
+    krv::nspio::Warning::SetSink([](const std::string&, const std::string&, unsigned int) {});
+    KRV_XMLUtil::Initialize(); // else every reading of tag 42112 starts it anew
+    return 0;
+}

@@ -85,18 +85,7 @@ StrileShape PageForm::GetShape() const
 
 bool PageForm::IsOwnCodec() const
 {
-    switch (mnCompression)
-    {
-    case COMPRESSION_NONE:
-    case COMPRESSION_LZW:
-    case COMPRESSION_PACKBITS:
-    case COMPRESSION_ZSTD:
-    case COMPRESSION_DEFLATE:
-    case COMPRESSION_ADOBE_DEFLATE:
-        return !mbReversedBits;
-    default:
-        return false;
-    }
+    return IsOwnCompression(mnCompression) && !mbReversedBits;
 }
 
 int PageForm::GetAlphaChannel() const

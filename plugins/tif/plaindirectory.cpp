@@ -76,22 +76,6 @@ bool Fits(const RawDirectory& oDirectory, PeekReader& oReader, const DirectoryEn
     return oValues.size() == oEntry.mnCount && std::all_of(oValues.begin(), oValues.end(), InRange);
 }
 
-bool IsOwnCompression(std::uint64_t nCompression)
-{
-    switch (nCompression)
-    {
-    case COMPRESSION_NONE:
-    case COMPRESSION_LZW:
-    case COMPRESSION_PACKBITS:
-    case COMPRESSION_ZSTD:
-    case COMPRESSION_DEFLATE:
-    case COMPRESSION_ADOBE_DEFLATE:
-        return true;
-    default:
-        return false;
-    }
-}
-
 // libtiff counts channels without a colour as extra ones, and looks for the colours of a palette.
 bool HasItsColours(const RawDirectory& oDirectory, PeekReader& oReader, std::uint64_t nChannels)
 {
@@ -110,6 +94,22 @@ bool HasItsColours(const RawDirectory& oDirectory, PeekReader& oReader, std::uin
 }
 
 } // namespace
+
+bool IsOwnCompression(std::uint64_t nCompression)
+{
+    switch (nCompression)
+    {
+    case COMPRESSION_NONE:
+    case COMPRESSION_LZW:
+    case COMPRESSION_PACKBITS:
+    case COMPRESSION_ZSTD:
+    case COMPRESSION_DEFLATE:
+    case COMPRESSION_ADOBE_DEFLATE:
+        return true;
+    default:
+        return false;
+    }
+}
 
 bool IsPlainDirectory(const RawDirectory& oDirectory, PeekReader& oReader)
 {

@@ -3,6 +3,8 @@
 #include "plugins/tif/peekreader.h"
 #include "plugins/tif/rawdirectory.h"
 
+#include <cstdint>
+
 namespace krv::plugins::tif
 {
 
@@ -10,5 +12,8 @@ namespace krv::plugins::tif
 // order, of the usual type and count, with values that go together, and a compression that is decoded here. Such a
 // directory says the same to everybody; what libtiff makes of any other, it has to be asked.
 bool IsPlainDirectory(const RawDirectory& oDirectory, PeekReader& oReader);
+
+// Whether blocks of the compression are decoded here, not by libtiff.
+bool IsOwnCompression(std::uint64_t nCompression);
 
 } // namespace krv::plugins::tif

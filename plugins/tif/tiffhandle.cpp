@@ -90,7 +90,7 @@ void TiffHandle::Client::Note(const char* pText, bool bWarning) noexcept
     if (bWarning && text.find("extraneous bytes before marker") != std::string_view::npos)
         return;
     mbLostData = true;
-    for (const char* pWords : {"not supported", "nsupported", "not configured", "not implemented"})
+    for (const char* pWords : {"not supported", "nsupported", "not configured", "mplemented"})
         mbUnknownKind |= text.find(pWords) != std::string_view::npos;
     try
     {

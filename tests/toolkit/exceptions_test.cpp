@@ -7,7 +7,7 @@ using krv::SourceFileText;
 TEST(Place, SourceFilesAreNamedFromTheRootOfTheTreeWhereverItLies)
 {
     for (const char* pFile :
-         {"plugins/tif/page.cpp", "/work/plugins/tif/page.cpp", "/a/datasources/plugins/tif/page.cpp",
+         {"plugins/tif/page.cpp", "/src/plugins/tif/page.cpp", "/a/datasources/plugins/tif/page.cpp",
           "/plugins/toolkit/gobs/plugins/tif/page.cpp", "../../plugins/tif/page.cpp"})
         EXPECT_EQ(SourceFileText(pFile), "plugins/tif/page") << pFile;
     EXPECT_EQ(SourceFileText("plugins/tools/page.cpp"), "plugins/tools/page"); // a folder inside the tree
