@@ -268,6 +268,21 @@ BlockImage::Pixels BlockImage::LoadBlock(const BlockAddress& oBlock, const Pixel
     return FindBlock(oBlock, oPart);
 }
 
+// Nothing when the block is damaged and the part of it may be read for itself.
+BlockImage::Pixels BlockImage::TryLoad(const BlockAddress& oBlock, const PixelRect& oPart)
+{
+    try
+    {
+        return LoadBlock(oBlock, oPart);
+    }
+    catch (const krv::FileException&)
+    {
+        if (!mpoSource->SparesParts())
+            throw;
+        return {};
+    }
+}
+
 // The same rows of a block in all of its width: the windows beside this one want further columns of them.
 BlockImage::Pixels BlockImage::GetRows(const BlockAddress& oBlock, const PixelRect& oPart)
 {
@@ -306,8 +321,10 @@ BlockImage::Pixels BlockImage::ObtainPart(const BlockAddress& oBlock, const Pixe
     const Pixels oCached = FindBlock(oBlock, oPart);
     if (oCached.mpFirst != nullptr)
         return oCached;
-    if (eKeep != Keep::eNothing)
-        return eKeep == Keep::eBlock ? LoadBlock(oBlock, oPart) : GetRows(oBlock, oPart);
+    if (eKeep == Keep::eRows)
+        return GetRows(oBlock, oPart);
+    if (const Pixels oLoaded = eKeep == Keep::eBlock ? TryLoad(oBlock, oPart) : Pixels(); oLoaded.mpFirst != nullptr)
+        return oLoaded;
     const std::size_t nPitch = oPart.mnWidth * moLayout.GetPixelBytes(oBlock.mnPlane);
     unsigned char* pScratch = oScratch.Get(nPitch * oPart.mnHeight);
     mpoSource->ReadBlock(oBlock, oPart, pScratch, nPitch);
@@ -321,10 +338,10 @@ void BlockImage::ReadOnePlane(const Job& oJob, const BlockAddress& oBlock, const
     if (oJob.moChannels.IsWholePlane())
     {
         Pixels oPixels = FindBlock(oBlock, oPart);
-        if (oPixels.mpFirst == nullptr && eKeep == Keep::eNothing)
-            return mpoSource->ReadBlock(oBlock, oPart, pTarget, oJob.mnPitch);
+        if (oPixels.mpFirst == nullptr && eKeep != Keep::eNothing)
+            oPixels = eKeep == Keep::eBlock ? TryLoad(oBlock, oPart) : GetRows(oBlock, oPart);
         if (oPixels.mpFirst == nullptr)
-            oPixels = eKeep == Keep::eBlock ? LoadBlock(oBlock, oPart) : GetRows(oBlock, oPart);
+            return mpoSource->ReadBlock(oBlock, oPart, pTarget, oJob.mnPitch);
         return CopyRows(oPixels.mpFirst, oPixels.mnPitch, pTarget, oJob.mnPitch, oPart.mnWidth * nPixelBytes,
                         oPart.mnHeight);
     }
@@ -435,7 +452,7 @@ void BlockImage::WritePart(const ChannelSelection& oChannels, const PixelRect& o
     unsigned char* pPlane = moScratch.Get(nPlanePitch * oPart.mnHeight);
     if (!oChannels.CoversPlane(oBlock.mnPlane, nPlaneChannels))
     {
-        const Pixels oOld = mbParts ? ObtainPart(oBlock, oPart, Keep::eNothing, moScratch) : LoadBlock(oBlock, oPart);
+        const Pixels oOld = ObtainPart(oBlock, oPart, mbParts ? Keep::eNothing : Keep::eBlock, moScratch);
         if (oOld.mpFirst != pPlane)
             CopyRows(oOld.mpFirst, oOld.mnPitch, pPlane, nPlanePitch, nPlanePitch, oPart.mnHeight);
         GetCache().Drop({this, oBlock.mnPlane, moLayout.GetBlockIndex(oBlock.mnColumn, oBlock.mnRow)});

@@ -102,6 +102,7 @@ private:
     Pixels ObtainPart(const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep, Scratch& oScratch);
     Pixels FindBlock(const BlockAddress& oBlock, const PixelRect& oPart);
     Pixels LoadBlock(const BlockAddress& oBlock, const PixelRect& oPart);
+    Pixels TryLoad(const BlockAddress& oBlock, const PixelRect& oPart);
     Pixels GetRows(const BlockAddress& oBlock, const PixelRect& oPart);
     void FillEntry(BlockCache& oCache, const BlockCache::Key& oKey, const BlockAddress& oBlock, const PixelRect& oPart,
                    unsigned char* pTarget);

@@ -28,12 +28,17 @@ public:
 
     // Reads a part of a block. oPart counts from the block's own corner and lies inside the block and the image. Row r
     // of the part goes to pTarget + r * nPitch; bytes between the rows stay untouched. Throws krv::FileException kinds
-    // that name the file. When ReadsParts is false the part is always all of the block that lies in the image.
+    // that name the file. When ReadsParts and SparesParts are false the part is always all of the block that lies in
+    // the image.
     virtual void ReadBlock(const BlockAddress& oBlock, const PixelRect& oPart, unsigned char* pTarget,
                            std::size_t nPitch) = 0;
 
     // Whether a part costs about as much as its own rows, so that reading it again is cheaper than keeping blocks.
     virtual bool ReadsParts() const { return false; }
+
+    // Whether a part can be read even when all of its block cannot, since damage elsewhere in the block does not touch
+    // it: ReadBlock is then asked for the part alone after it failed for the block.
+    virtual bool SparesParts() const { return false; }
 
     // The counterpart of ReadBlock for any part. Unless overridden it throws DataException: the format is read only.
     virtual void WriteBlock(const BlockAddress& oBlock, const PixelRect& oPart, const unsigned char* pSource,

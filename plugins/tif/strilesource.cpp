@@ -253,8 +253,24 @@ void StrileSource::ReadCoded(const Piece& oPiece, const Strile& oStrile)
     Strile oRaw = oStrile;
     oRaw.mnBytes = oStrile.mbBytesKnown ? std::min(oStrile.mnBytes, nMost) : nMost;
     unsigned char* pRaw = ReadRaw(oPiece, oRaw);
-    moDecoder.Decode(oPiece.mnStrile, oPiece.mnStoredRows, pRaw, static_cast<std::size_t>(oRaw.mnBytes),
-                     oPiece.moWanted);
+    const auto Decode = [&](const WantedPixels& oWanted)
+    {
+        moDecoder.Decode(oPiece.mnStrile, oPiece.mnStoredRows, pRaw, static_cast<std::size_t>(oRaw.mnBytes), oWanted);
+    };
+    const WantedPixels& oWanted = oPiece.moWanted;
+    if (moForm.mbTiled || (oPiece.mnX == 0 && oPiece.mnY == 0 && oWanted.mnWidth == moForm.mnWidth))
+        Decode(oWanted);
+    else
+    {
+        // A part of a strip, wanted where the block as a whole is damaged.
+        const std::size_t nPitch = moForm.GetRowBytes(moForm.mnWidth);
+        std::vector<unsigned char> oRows(nPitch * (oPiece.mnY + oWanted.mnRows));
+        Decode({moForm.mnWidth, oPiece.mnY + oWanted.mnRows, oRows.data(), nPitch});
+        for (std::uint32_t nRow = 0; nRow < oWanted.mnRows; ++nRow)
+            std::memcpy(oWanted.mpTarget + nRow * oWanted.mnPitch,
+                        oRows.data() + (oPiece.mnY + nRow) * nPitch + moForm.GetRowBytes(oPiece.mnX),
+                        moForm.GetRowBytes(oWanted.mnWidth));
+    }
     moDecoder.Relax();
 }
 

@@ -37,6 +37,8 @@ public:
     void ReadBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
                    std::size_t nPitch) override;
     bool ReadsParts() const override { return mbPlain; }
+    // A block may be several strips.
+    bool SparesParts() const override { return !moForm.mbTiled; }
     std::string GetName() const override { return mpoPage->GetFileName(); }
 
     // To be called after the file was written: what was read ahead is read anew.

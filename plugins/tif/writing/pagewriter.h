@@ -29,6 +29,7 @@ public:
 
     const support::ImageLayout& GetLayout() const { return moReader.GetLayout(); }
     bool ReadsParts() const { return moReader.ReadsParts(); }
+    bool SparesParts() const { return moReader.SparesParts(); }
     std::string GetName() const { return mpoEditor->GetFileName(); }
     PageModel& GetModel() { return *mpoModel; }
 
@@ -107,6 +108,7 @@ public:
         mpoWriter->Read(oBlock, oPart, pTarget, nPitch);
     }
     bool ReadsParts() const override { return mpoWriter->ReadsParts(); }
+    bool SparesParts() const override { return mpoWriter->SparesParts(); }
     void WriteBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, const unsigned char* pSource,
                     std::size_t nPitch) override
     {

@@ -349,6 +349,44 @@ TEST(TifHostile, DamageThatLibtiffSeesIsSeen)
     }
 }
 
+// Strips are read several at a time; what is wrong with one does not cost the rows of the others.
+TEST(TifHostile, ADamagedStripCostsItsOwnRowsAlone)
+{
+    const TempFolder oFolder;
+    const std::string file = oFolder.File("file.tif");
+    for (const char* pOptions : {"INTERLEAVE=PIXEL", "INTERLEAVE=BAND"})
+    {
+        std::filesystem::remove(file);
+        const krv::gobs::DataType oType(krv::gobs::eDT_8U);
+        const Bytes oPixels = MakePixels(40, 64, 2, oType, 1);
+        TifPointer poFile =
+            CreateTif(file, std::string("COMPRESS=DEFLATE TILED=NO BLOCKYSIZE=16 ") + pOptions, 40, 64, 2, oType);
+        WriteAll(*poFile, oPixels);
+        poFile->Close();
+        TIFF* const poTiff = TIFFOpen(file.c_str(), "r");
+        const auto nPlace = static_cast<std::size_t>(TIFFGetStrileOffset(poTiff, 1));
+        TIFFClose(poTiff);
+        std::string bytes = ReadFile(file);
+        bytes[nPlace + 10] ^= 0x7F;
+        WriteFile(file, bytes);
+        for (const AccessMode eMode : {eReadOnly, eUpdate})
+        {
+            poFile = OpenTif(file, eMode);
+            const std::unique_ptr<krv::datasources::IRasterIO> poIO(poFile->GetRasterIO({2, 1}));
+            EXPECT_GT(poIO->GetTileHeight(), 16u) << "several strips a block";
+            Bytes oRow(80);
+            EXPECT_THROW(poIO->ReadWindow(0u, 16u, 40u, 1u, oRow.data()), krv::FileException);
+            EXPECT_THROW(poIO->ReadWindow(3u, 15u, 5u, 2u, oRow.data()), krv::FileException);
+            for (const unsigned int nY : {0u, 15u, 32u, 63u})
+            {
+                ASSERT_NO_THROW(poIO->ReadWindow(0u, nY, 40u, 1u, oRow.data())) << nY;
+                for (unsigned int n = 0; n < 80; ++n)
+                    ASSERT_EQ(oRow[n], oPixels[nY * 80 + (n ^ 1)]) << nY;
+            }
+        }
+    }
+}
+
 std::string RecipeName(const ::testing::TestParamInfo<Recipe>& oInfo)
 {
     return "Codec" + std::to_string(oInfo.param.compression) + "n" + std::to_string(oInfo.index);
