@@ -2,8 +2,8 @@
 // record. An input is the file, the program, and the length of the program in its last two bytes.
 #include "fuzz/support/edits.h"
 #include "fuzz/support/inputfile.h"
-#include "plugins/tif/pagelist.h"
-#include "plugins/tif/rawdirectory.h"
+#include "plugins/tif/reading/pagelist.h"
+#include "plugins/tif/reading/rawdirectory.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>

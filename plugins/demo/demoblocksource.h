@@ -1,7 +1,7 @@
 #pragma once
 
 #include "plugins/demo/demofile.h"
-#include "plugins/support/iblocksource.h"
+#include "plugins/support/image/iblocksource.h"
 
 #include <memory>
 

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "plugins/demo/demoheader.h"
-#include "plugins/support/file.h"
+#include "plugins/support/file/file.h"
 
 #include <memory>
 

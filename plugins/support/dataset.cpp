@@ -2,8 +2,8 @@
 
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/raster/rasterinfo.h"
-#include "plugins/support/rasterio.h"
-#include "plugins/support/storedchannelinfo.h"
+#include "plugins/support/image/rasterio.h"
+#include "plugins/support/image/storedchannelinfo.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 

@@ -3,9 +3,9 @@
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/interfaces/irasterdataset.h"
-#include "plugins/support/blockcache.h"
-#include "plugins/support/blockimage.h"
-#include "plugins/support/iblocksource.h"
+#include "plugins/support/image/blockcache.h"
+#include "plugins/support/image/blockimage.h"
+#include "plugins/support/image/iblocksource.h"
 
 #include <exception>
 #include <memory>

@@ -1,6 +1,6 @@
 #include "plugins/tif/tifbuilder.h"
 
-#include "plugins/tif/rawdirectory.h"
+#include "plugins/tif/reading/rawdirectory.h"
 #include "plugins/tif/tifdataset.h"
 #include "plugins/tif/writing/fileeditor.h"
 

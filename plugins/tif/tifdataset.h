@@ -8,9 +8,9 @@
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "plugins/support/dataset.h"
-#include "plugins/tif/page.h"
-#include "plugins/tif/pagelist.h"
-#include "plugins/tif/strilesource.h"
+#include "plugins/tif/reading/page.h"
+#include "plugins/tif/reading/pagelist.h"
+#include "plugins/tif/reading/strilesource.h"
 #include "plugins/tif/writing/fileeditor.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 

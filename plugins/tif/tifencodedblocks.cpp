@@ -1,5 +1,5 @@
 // The blocks of a TIFF file as bytes: the facet IEncodedBlocks of its dataset.
-#include "plugins/tif/pagesource.h"
+#include "plugins/tif/reading/pagesource.h"
 #include "plugins/tif/tifdataset.h"
 #include "plugins/tif/writing/encodedform.h"
 #include "plugins/tif/writing/pagewriter.h"

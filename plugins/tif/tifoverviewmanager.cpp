@@ -1,7 +1,7 @@
 #include "plugins/tif/tifoverviewmanager.h"
 
 #include "datasources/metadata/auxiliarydata.h"
-#include "plugins/support/rasterio.h"
+#include "plugins/support/image/rasterio.h"
 #include "plugins/tif/tifdataset.h"
 #include "toolkit/exceptions/exceptions.h"
 

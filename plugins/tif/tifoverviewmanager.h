@@ -1,7 +1,7 @@
 #pragma once
 
 #include "datasources/interfaces/ioverviewmanager.h"
-#include "plugins/tif/strilesource.h"
+#include "plugins/tif/reading/strilesource.h"
 
 namespace krv::plugins::tif
 {

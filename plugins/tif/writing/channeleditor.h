@@ -1,6 +1,6 @@
 #pragma once
 
-#include "plugins/support/blockimage.h"
+#include "plugins/support/image/blockimage.h"
 #include "plugins/tif/writing/fileeditor.h"
 
 #include <memory>

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "plugins/support/file.h"
-#include "plugins/tif/rawdirectory.h"
+#include "plugins/support/file/file.h"
+#include "plugins/tif/reading/rawdirectory.h"
 #include "plugins/tif/writing/pagemodel.h"
 
 #include <memory>

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "plugins/tif/rawdirectory.h"
+#include "plugins/tif/reading/rawdirectory.h"
 #include "plugins/tif/writing/pagemodel.h"
 
 #include <cstdint>

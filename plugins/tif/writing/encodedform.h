@@ -1,7 +1,7 @@
 #pragma once
 
 #include "datasources/interfaces/iencodedblocks.h"
-#include "plugins/tif/page.h"
+#include "plugins/tif/reading/page.h"
 #include "plugins/tif/writing/pagemodel.h"
 
 #include <cstdint>

@@ -1,8 +1,8 @@
 #pragma once
 
-#include "plugins/support/file.h"
-#include "plugins/support/space.h"
-#include "plugins/tif/page.h"
+#include "plugins/support/file/file.h"
+#include "plugins/support/file/space.h"
+#include "plugins/tif/reading/page.h"
 #include "plugins/tif/writing/pagemodel.h"
 #include "plugins/tif/writing/roomrecord.h"
 

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "plugins/tif/jpegheader.h"
-#include "plugins/tif/page.h"
+#include "plugins/tif/reading/jpegheader.h"
+#include "plugins/tif/reading/page.h"
 
 #include <cstddef>
 #include <cstdint>

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "plugins/tif/page.h"
+#include "plugins/tif/reading/page.h"
 
 #include <cstddef>
 #include <cstdint>

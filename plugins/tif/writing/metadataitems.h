@@ -1,6 +1,6 @@
 #pragma once
 
-#include "plugins/tif/metadata.h"
+#include "plugins/tif/reading/metadata.h"
 
 #include <map>
 #include <string>

@@ -1,9 +1,9 @@
 #pragma once
 
 #include "datasources/metadata/auxiliarydata.h"
-#include "plugins/tif/metadata.h"
+#include "plugins/tif/geo/geowriter.h"
+#include "plugins/tif/reading/metadata.h"
 #include "plugins/tif/writing/fileeditor.h"
-#include "plugins/tif/writing/geowriter.h"
 
 #include <memory>
 #include <set>

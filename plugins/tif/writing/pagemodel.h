@@ -1,7 +1,7 @@
 #pragma once
 
-#include "plugins/tif/pagelist.h"
-#include "plugins/tif/striletable.h"
+#include "plugins/tif/reading/pagelist.h"
+#include "plugins/tif/reading/striletable.h"
 #include "plugins/tif/writing/createoptions.h"
 #include "plugins/tif/writing/taglist.h"
 

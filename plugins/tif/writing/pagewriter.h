@@ -1,7 +1,7 @@
 #pragma once
 
-#include "plugins/support/iblocksource.h"
-#include "plugins/tif/strilesource.h"
+#include "plugins/support/image/iblocksource.h"
+#include "plugins/tif/reading/strilesource.h"
 #include "plugins/tif/writing/fileeditor.h"
 #include "plugins/tif/writing/strileencoder.h"
 

@@ -1,6 +1,6 @@
 #include "plugins/tif/writing/roomrecord.h"
 
-#include "plugins/tif/rawdirectory.h"
+#include "plugins/tif/reading/rawdirectory.h"
 #include "plugins/tif/writing/taglist.h"
 
 #include <algorithm>

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "plugins/support/file.h"
-#include "plugins/support/space.h"
+#include "plugins/support/file/file.h"
+#include "plugins/support/file/space.h"
 
 #include <cstdint>
 #include <optional>

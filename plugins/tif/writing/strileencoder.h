@@ -3,9 +3,9 @@
 #include "plugins/support/codec/deflateencoder.h"
 #include "plugins/support/codec/lzwencoder.h"
 #include "plugins/support/codec/zstdencoder.h"
-#include "plugins/support/scratch.h"
-#include "plugins/tif/page.h"
-#include "plugins/tif/strilesource.h"
+#include "plugins/support/image/scratch.h"
+#include "plugins/tif/reading/page.h"
+#include "plugins/tif/reading/strilesource.h"
 #include "plugins/tif/writing/jpegencoder.h"
 #include "toolkit/exceptions/place.h"
 

@@ -1,8 +1,8 @@
 #pragma once
 
-#include "plugins/support/file.h"
-#include "plugins/support/space.h"
-#include "plugins/tif/rawdirectory.h"
+#include "plugins/support/file/file.h"
+#include "plugins/support/file/space.h"
+#include "plugins/tif/reading/rawdirectory.h"
 
 #include <cstdint>
 #include <memory>

@@ -1,4 +1,4 @@
-#include "plugins/tif/geokeys.h"
+#include "plugins/tif/geo/geokeys.h"
 #include "tests/support/facts.h"
 #include "tests/support/thrown.h"
 #include "tests/support/tiffwriter.h"

@@ -1,4 +1,4 @@
-#include "plugins/support/space.h"
+#include "plugins/support/file/space.h"
 
 #include <algorithm>
 #include <map>

@@ -3,7 +3,7 @@
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/pct/pct.h"
 #include "gobs/raster/rasterinfo.h"
-#include "plugins/tif/rawdirectory.h"
+#include "plugins/tif/reading/rawdirectory.h"
 #include "tests/plugins/tif/tifsupport.h"
 #include "tests/support/tiffwriter.h"
 #include "toolkit/exceptions/exceptions.h"

@@ -3,7 +3,7 @@
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/metadata/pixelstatistics.h"
-#include "plugins/tif/rawdirectory.h"
+#include "plugins/tif/reading/rawdirectory.h"
 #include "tests/plugins/tif/tifsupport.h"
 #include "tests/support/facts.h"
 #include "tests/support/tiffwriter.h"

@@ -1,0 +1,123 @@
+#pragma once
+
+#include "plugins/support/image/scratch.h"
+#include "toolkit/exceptions/place.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <source_location>
+#include <string>
+#include <vector>
+
+namespace krv::plugins::support
+{
+
+// An open file that is read and written at given offsets, without mapping and without a position of its own. A file is
+// written by one object at a time, of all programs; readers are not held up. Every
+// failure is an exception that names the file and the cause, a file that became shorter meanwhile included. A file may
+// be read by several threads.
+class File
+{
+public:
+    enum class Mode
+    {
+        eRead,   // an existing file
+        eUpdate, // an existing file, to be written too
+        eCreate  // a new or emptied file
+    };
+
+    // Throws FileNotFoundException when there is no such file, IOException when it cannot be opened, is no plain file
+    // or is being written by somebody else.
+    File(const std::string& fileName, Mode eMode, const Place& oPlace = Place::Current());
+    ~File();
+    File(const File&) = delete;
+    File& operator=(const File&) = delete;
+
+    // What transfers take in place of a Place, which costs memory and is made only when something is thrown.
+    using Location = std::source_location;
+
+    const std::string& GetName() const { return moName; }
+    // The size at the moment of opening; writing beyond the end raises it.
+    std::uint64_t GetSize() const { return mnSize; }
+
+    // Reads exactly nBytes. Throws IOException when the file ends before.
+    void Read(std::uint64_t nOffset, void* pTarget, std::size_t nBytes, Location oLocation = Location::current()) const;
+
+    // Reads up to nBytes and returns how many there were: fewer only at the end of the file.
+    std::size_t ReadUpTo(std::uint64_t nOffset, void* pTarget, std::size_t nBytes,
+                         Location oLocation = Location::current()) const;
+
+    // Reads nRows rows of nRowBytes that lie nStoredPitch bytes apart in the file, into rows nPitch bytes apart, with
+    // as few calls to the system as pays; what lies between the rows of the target stays untouched.
+    void ReadRows(std::uint64_t nOffset, std::size_t nStoredPitch, std::size_t nRowBytes, std::size_t nRows,
+                  unsigned char* pTarget, std::size_t nPitch, Scratch& oScratch,
+                  Location oLocation = Location::current()) const;
+
+    void Write(std::uint64_t nOffset, const void* pSource, std::size_t nBytes,
+               Location oLocation = Location::current());
+    void WriteRows(std::uint64_t nOffset, std::size_t nStoredPitch, std::size_t nRowBytes, std::size_t nRows,
+                   const unsigned char* pSource, std::size_t nPitch, Location oLocation = Location::current());
+
+    // Makes sure that what was written reaches the disk. Throws when the file lost its name meanwhile: nobody would
+    // find it again.
+    void Flush(const Place& oPlace = Place::Current());
+
+    // Cuts off what this object wrote behind nBytes, unless somebody else wrote there too. Failures leave the file as
+    // it is.
+    void CutBack(std::uint64_t nBytes) noexcept;
+
+    // Tells writers that this object reads the state of the file that a root names: its place, or another number below
+    // 2^62. Until another one is held, or the object goes. Returns false where the file system has no locks. What is
+    // read is of that state if the root is the file's still after the call; see HoldRoot.
+    bool Hold(std::uint64_t nRoot) noexcept;
+    // The roots that others hold, in this process or another; no value where that cannot be known.
+    std::optional<std::vector<std::uint64_t>> FindHeld() const;
+
+    // Nothing more is written: others may. Reading goes on.
+    void EndWriting() noexcept;
+
+    // From now on messages, and GetName, name the file otherwise.
+    void ShowAs(const std::string& fileName) { moName = fileName; }
+
+    // Gives the file another name in the same file system and makes sure that it reaches the disk. A file of that name
+    // is replaced, and its permissions are taken over; unless bReplace is set it stays, and IOException says so.
+    void Rename(const std::string& fileName, bool bReplace, const Place& oPlace = Place::Current());
+
+private:
+    bool CanSeeLocks() const;
+
+    std::string moName;
+    std::string moPath;
+    int mnDescriptor = -1;
+    std::uint64_t mnSize = 0;
+    bool mbLinked = false; // some file systems do not count names
+    std::optional<std::uint64_t> moHeld;
+    mutable std::optional<bool> moSeesLocks;
+};
+
+// Holds the state that a file is in. oReadRoot: reads the root from the file, as often as a writer changes it just now;
+// what was read last is held.
+template <typename ReadRoot>
+void HoldRoot(File& oFile, ReadRoot oReadRoot)
+{
+    std::uint64_t nRoot = oReadRoot();
+    while (oFile.Hold(nRoot))
+    {
+        const std::uint64_t nNow = oReadRoot();
+        if (nNow == nRoot)
+            return;
+        nRoot = nNow;
+    }
+}
+
+// A name for what becomes fileName when it is whole: in the same folder, so that it can be renamed, of no length that a
+// folder does not take, and of this process alone. Throws FileNotFoundException when there is no such folder, and
+// IOException when the folder must not be written, when a folder, a device or the like has the name, or a file that
+// must not be written: renaming would put the file in its place. So does any file when bReplace is not set.
+std::string MakeTemporaryName(const std::string& fileName, bool bReplace, const Place& oPlace = Place::Current());
+
+// The text of an error number, in the C locale.
+std::string SystemErrorText(int nError);
+
+} // namespace krv::plugins::support

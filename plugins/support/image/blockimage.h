@@ -1,0 +1,131 @@
+#pragma once
+
+#include "plugins/support/codec/interleave.h"
+#include "plugins/support/image/blockcache.h"
+#include "plugins/support/image/iblocksource.h"
+#include "plugins/support/image/scratch.h"
+#include "toolkit/exceptions/place.h"
+
+#include <cstddef>
+#include <memory>
+#include <vector>
+
+namespace krv::plugins::support
+{
+
+// A list of channels of one type, in the order of the caller's pixels, repeats allowed.
+class ChannelSelection
+{
+public:
+    // Channels from 1. Throws DataException for an empty list, a channel that does not exist and several types.
+    ChannelSelection(const ImageLayout& oLayout, const std::vector<unsigned int>& oChannels,
+                     const Place& oPlace = Place::Current());
+
+    const std::vector<ChannelPlace>& GetPlaces() const { return moPlaces; }
+    std::size_t GetCount() const { return moPlaces.size(); }
+    const krv::gobs::DataType& GetDataType() const { return moType; }
+    std::size_t GetValueBytes() const { return mnValueBytes; }
+    std::size_t GetPixelBytes() const { return mnValueBytes * moPlaces.size(); }
+
+    // Whether all come from one plane; whether they are just that plane's pixels.
+    bool IsOnePlane() const { return mbOnePlane; }
+    bool IsWholePlane() const { return mbWholePlane; }
+    // Whether no channel of a plane is missing.
+    bool CoversPlane(unsigned int nPlane, unsigned int nPlaneChannels) const;
+    // Whether every plane that takes part has one channel.
+    bool IsSinglePlanes() const { return mbSinglePlanes; }
+    // The positions within the plane, for a selection of one plane.
+    const std::vector<std::size_t>& GetPositions() const { return moPositions; }
+
+private:
+    std::vector<ChannelPlace> moPlaces;
+    std::vector<std::size_t> moPositions;
+    krv::gobs::DataType moType;
+    std::size_t mnValueBytes = 0;
+    bool mbOnePlane = true;
+    bool mbWholePlane = false;
+    bool mbSinglePlanes = true;
+};
+
+// An image made of blocks, read and written in rectangles. Blocks that are wanted whole are decoded straight into the
+// caller's memory; others go through the cache, so that neighbouring windows decode each block once. Sources that read
+// parts are asked for just the rows that a window touches, unless consecutive windows share blocks. One thread at a
+// time.
+class BlockImage
+{
+public:
+    // oCache: shared by the images of one dataset.
+    BlockImage(std::unique_ptr<IBlockSource> poSource, std::shared_ptr<BlockCache> poCache);
+    ~BlockImage();
+    BlockImage(const BlockImage&) = delete;
+    BlockImage& operator=(const BlockImage&) = delete;
+
+    const ImageLayout& GetLayout() const { return moLayout; }
+    IBlockSource& GetSource() { return *mpoSource; }
+
+    // A rectangle inside the image; row r goes to pTarget + r * nPitch.
+    void Read(const ChannelSelection& oChannels, const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch);
+    void Write(const ChannelSelection& oChannels, const PixelRect& oRect, const unsigned char* pSource,
+               std::size_t nPitch);
+
+    // Forgets decoded blocks, when the file changed.
+    void DropBlocks();
+
+private:
+    struct Range;
+    struct Pixels;
+    struct Job;
+
+    // What is kept of a block of which a part is wanted.
+    enum class Keep
+    {
+        eNothing,
+        eRows, // the wanted rows in all their width
+        eBlock
+    };
+
+    void ReadPart(const Job& oJob, unsigned int nColumn, unsigned int nRow);
+    void ReadOnePlane(const Job& oJob, const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
+                      unsigned char* pTarget);
+    void ReadPlanes(const Job& oJob, const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
+                    unsigned char* pTarget);
+    static void InterleaveParts(const std::vector<Pixels>& oParts, unsigned char* pTarget, std::size_t nPitch,
+                                const codec::PixelArea& oArea);
+    void CopyChannel(const unsigned char* pSource, std::size_t nSourcePitch, std::size_t nSourceChannel,
+                     std::size_t nSourceChannels, unsigned char* pTarget, std::size_t nTargetPitch,
+                     std::size_t nTargetChannel, std::size_t nTargetChannels, const codec::PixelArea& oArea);
+    void WritePart(const ChannelSelection& oChannels, const PixelRect& oRect, const BlockAddress& oBlock,
+                   const unsigned char* pSource, std::size_t nPitch);
+    void ReserveRowCache(const Job& oJob);
+    bool IsThin(unsigned int nRows) const;
+    unsigned int CountThinRows(const Job& oJob) const;
+    Pixels ObtainPart(const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep, Scratch& oScratch);
+    Pixels FindBlock(const BlockAddress& oBlock, const PixelRect& oPart);
+    Pixels LoadBlock(const BlockAddress& oBlock, const PixelRect& oPart);
+    Pixels TryLoad(const BlockAddress& oBlock, const PixelRect& oPart);
+    Pixels GetRows(const BlockAddress& oBlock, const PixelRect& oPart);
+    void FillEntry(BlockCache& oCache, const BlockCache::Key& oKey, const BlockAddress& oBlock, const PixelRect& oPart,
+                   unsigned char* pTarget);
+    Keep ChooseKeep(const Job& oJob, unsigned int nColumn, unsigned int nRow, const PixelRect& oPart) const;
+    void NoteWindow(const Range& oRange, unsigned int nPlane);
+    BlockCache& GetCache() const { return mbParts ? *mpoRowCache : *mpoCache; }
+
+    std::unique_ptr<IBlockSource> mpoSource;
+    const ImageLayout& moLayout;
+    std::shared_ptr<BlockCache> mpoCache;
+    // For sources that read parts: few blocks suffice, and few stay in the processor's own caches.
+    std::unique_ptr<BlockCache> mpoRowCache;
+    std::unique_ptr<BlockCache> mpoThinCache;
+    bool mbParts;
+    bool mbSmallBlocks;
+    Scratch moScratch;
+    Scratch moChannelScratch;
+    std::vector<Scratch> moPlaneScratch;
+
+    // The blocks of the last window and how often windows shared blocks with the one before.
+    unsigned int maLastRange[4] = {1, 1, 0, 0};
+    unsigned int mnLastPlane = 0;
+    int mnSharing = 0;
+};
+
+} // namespace krv::plugins::support

@@ -1,0 +1,51 @@
+#pragma once
+
+#include "plugins/support/image/imagelayout.h"
+
+#include <cstddef>
+#include <string>
+
+namespace krv::plugins::support
+{
+
+// A block of one plane.
+struct BlockAddress
+{
+    unsigned int mnPlane = 0;
+    unsigned int mnColumn = 0;
+    unsigned int mnRow = 0;
+};
+
+// What a format knows of one image: its layout and how a block is read. Everything else (windows, clipping, caching,
+// interleaving, checks of arguments) is the base's. Values go in and out in this machine's byte order, a plane's
+// channels pixel interleaved. One thread at a time.
+class IBlockSource
+{
+public:
+    virtual ~IBlockSource();
+
+    virtual const ImageLayout& GetLayout() const = 0;
+
+    // Reads a part of a block. oPart counts from the block's own corner and lies inside the block and the image. Row r
+    // of the part goes to pTarget + r * nPitch; bytes between the rows stay untouched. Throws krv::FileException kinds
+    // that name the file. When ReadsParts and SparesParts are false the part is always all of the block that lies in
+    // the image.
+    virtual void ReadBlock(const BlockAddress& oBlock, const PixelRect& oPart, unsigned char* pTarget,
+                           std::size_t nPitch) = 0;
+
+    // Whether a part costs about as much as its own rows, so that reading it again is cheaper than keeping blocks.
+    virtual bool ReadsParts() const { return false; }
+
+    // Whether a part can be read even when all of its block cannot, since damage elsewhere in the block does not touch
+    // it: ReadBlock is then asked for the part alone after it failed for the block.
+    virtual bool SparesParts() const { return false; }
+
+    // The counterpart of ReadBlock for any part. Unless overridden it throws DataException: the format is read only.
+    virtual void WriteBlock(const BlockAddress& oBlock, const PixelRect& oPart, const unsigned char* pSource,
+                            std::size_t nPitch);
+
+    // The name of the file, for messages.
+    virtual std::string GetName() const = 0;
+};
+
+} // namespace krv::plugins::support

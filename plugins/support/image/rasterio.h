@@ -1,0 +1,64 @@
+#pragma once
+
+#include "datasources/interfaces/ioverviewio.h"
+#include "plugins/support/image/blockimage.h"
+
+#include <memory>
+#include <vector>
+
+namespace krv::plugins::support
+{
+
+// The transfer of windows for a list of channels of a block image, with all checks of arguments: sizes in 64 bits, a
+// part outside its window, null buffers; the part is clipped to the image. Base is IRasterIO or IOverviewIO.
+template <typename Base>
+class BlockRasterIO : public Base
+{
+public:
+    BlockRasterIO(std::shared_ptr<BlockImage> poImage, const std::vector<unsigned int>& oChannels,
+                  const Place& oPlace = Place::Current());
+    ~BlockRasterIO() override;
+
+    unsigned int GetFileWidth() const override;
+    unsigned int GetFileHeight() const override;
+    unsigned int GetTileWidth() const override;
+    unsigned int GetTileHeight() const override;
+
+    void ReadWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX, unsigned int nPartY,
+                    unsigned int nPartWidth, unsigned int nPartHeight, unsigned char* pBuffer) override;
+    void ReadWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
+                    unsigned char* pBuffer) override;
+    void WriteWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
+                     unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
+                     unsigned char* const pBuffer) override;
+    void WriteWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
+                     unsigned char* const pBuffer) override;
+
+private:
+    std::shared_ptr<BlockImage> mpoImage;
+    ChannelSelection moChannels;
+    // What readers are told to use: the layout's, but never more than 64 MiB for all channels together.
+    unsigned int mnTileWidth;
+    unsigned int mnTileHeight;
+};
+
+extern template class BlockRasterIO<krv::datasources::IRasterIO>;
+extern template class BlockRasterIO<krv::datasources::IOverviewIO>;
+
+using RasterIO = BlockRasterIO<krv::datasources::IRasterIO>;
+
+// The same for one overview level.
+class OverviewIO : public BlockRasterIO<krv::datasources::IOverviewIO>
+{
+public:
+    OverviewIO(unsigned int nLevel, std::shared_ptr<BlockImage> poImage, const std::vector<unsigned int>& oChannels,
+               const Place& oPlace = Place::Current());
+    ~OverviewIO() override;
+
+    unsigned int GetLevel() const override { return mnLevel; }
+
+private:
+    unsigned int mnLevel;
+};
+
+} // namespace krv::plugins::support
