@@ -1,6 +1,7 @@
 #include "gobs/raster/datatype.h"
 
 #include "gobs/raster/datatypeadapter.h"
+#include "gobs/raster/pixelvalue.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -23,23 +24,16 @@ struct Fields
     bool mbComplex;
 };
 
+template <class... Values>
+constexpr std::array<Fields, sizeof...(Values) + 1> MakeFields(std::type_identity<std::tuple<Values...>>)
+{
+    return {Fields{8 * sizeof(PartOf<Values>), std::is_signed_v<PartOf<Values>>,
+                   std::is_floating_point_v<PartOf<Values>>, PARTS_OF<Values> == 2}...,
+            Fields{1, false, false, false}};
+}
+
 // In the order of NativeDataTypeCode.
-constexpr std::array<Fields, 16> FIELDS = {{{8, false, false, false},
-                                            {8, true, false, false},
-                                            {16, false, false, false},
-                                            {16, true, false, false},
-                                            {32, false, false, false},
-                                            {32, true, false, false},
-                                            {32, true, true, false},
-                                            {64, false, false, false},
-                                            {64, true, false, false},
-                                            {64, true, true, false},
-                                            {16, false, false, true},
-                                            {16, true, false, true},
-                                            {32, true, false, true},
-                                            {32, true, true, true},
-                                            {64, true, true, true},
-                                            {1, false, false, false}}};
+constexpr auto FIELDS = MakeFields(std::type_identity<PixelValues>());
 
 const Fields& FieldsOf(NativeDataTypeCode eCode, const Place& oPlace)
 {

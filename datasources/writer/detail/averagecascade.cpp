@@ -3,6 +3,7 @@
 #include "datasources/writer/detail/leveltarget.h"
 #include "datasources/writer/detail/samplemath.h"
 #include "datasources/writer/detail/samplevectors.h"
+#include "gobs/raster/pixelvalue.h"
 
 #include <algorithm>
 #include <bit>
@@ -392,9 +393,11 @@ std::unique_ptr<IAverageSteps> MakeSteps(const SourceForm& oForm, bool bHalfVali
         return MakeVectorSteps<std::uint16_t>(oForm, bHalfValid);
     if (bVectors && eType == krv::gobs::eDT_32R)
         return MakeVectorSteps<float>(oForm, bHalfValid);
-    return ForSampleType(oForm.moType,
-                         [&](auto nSample) -> std::unique_ptr<IAverageSteps>
-                         { return std::make_unique<AnySteps<decltype(nSample)>>(oForm, bHalfValid); });
+    const auto Make = [&]<class T>(std::type_identity<T>) -> std::unique_ptr<IAverageSteps>
+    {
+        return std::make_unique<AnySteps<T>>(oForm, bHalfValid);
+    };
+    return krv::gobs::VisitPartType(oForm.moType, Make);
 }
 
 // Rows of a stage wait for the one below them in a slot of their own; the slots

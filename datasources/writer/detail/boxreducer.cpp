@@ -2,6 +2,8 @@
 #include "datasources/writer/detail/leveltarget.h"
 #include "datasources/writer/detail/modeof.h"
 #include "datasources/writer/detail/samplemath.h"
+#include "gobs/raster/pixelvalue.h"
+#include "toolkit/raster/convertvalue.h"
 
 #include <algorithm>
 #include <array>
@@ -97,13 +99,13 @@ struct PowerBox
     {
         const long double nRoot = std::sqrt(static_cast<long double>(mnPower) / static_cast<long double>(mnCount));
         if constexpr (P == 1)
-            return {SampleOf<T>(nRoot)};
+            return {krv::raster::ConvertValue<T>(nRoot)};
         const auto nReal = static_cast<long double>(moSums[0]);
         const auto nImaginary = static_cast<long double>(moSums[P - 1]);
         const long double nLength = std::hypot(nReal, nImaginary);
         Value<T, P> oResult{};
-        oResult[0] = SampleOf<T>(nLength > 0 ? nRoot * nReal / nLength : nRoot);
-        oResult[P - 1] = SampleOf<T>(nLength > 0 ? nRoot * nImaginary / nLength : 0.0L);
+        oResult[0] = krv::raster::ConvertValue<T>(nLength > 0 ? nRoot * nReal / nLength : nRoot);
+        oResult[P - 1] = krv::raster::ConvertValue<T>(nLength > 0 ? nRoot * nImaginary / nLength : 0.0L);
         return oResult;
     }
     std::uint64_t mnCount = 0;
@@ -444,13 +446,11 @@ std::unique_ptr<ILevelReducer> MakeBoxReducer(const SourceForm& oForm, const Lev
 {
     if (eMethod == Resampling::eNearest)
         return std::make_unique<NearestReducer>(oForm, oTask);
-    return ForSampleType(oForm.moType,
-                         [&](auto nSample)
-                         {
-                             using T = decltype(nSample);
-                             return oForm.moType.IsComplex() ? MakeFor<T, 2>(oForm, oTask, eMethod, oOptions)
-                                                             : MakeFor<T, 1>(oForm, oTask, eMethod, oOptions);
-                         });
+    const auto Make = [&]<class Value>(std::type_identity<Value>)
+    {
+        return MakeFor<krv::gobs::PartOf<Value>, krv::gobs::PARTS_OF<Value>>(oForm, oTask, eMethod, oOptions);
+    };
+    return krv::gobs::VisitPixelType(oForm.moType, Make);
 }
 
 } // namespace krv::datasources::detail

@@ -1,6 +1,8 @@
 #include "datasources/writer/detail/levelreducer.h"
 #include "datasources/writer/detail/leveltarget.h"
 #include "datasources/writer/detail/samplemath.h"
+#include "gobs/raster/pixelvalue.h"
+#include "toolkit/raster/convertvalue.h"
 
 #include <algorithm>
 #include <cmath>
@@ -204,7 +206,7 @@ private:
     // NaN stays what it is.
     T Limit(const Row& oRow, std::size_t nAt, Real nValue) const
     {
-        const T nSample = SampleOf<T>(nValue);
+        const T nSample = krv::raster::ConvertValue<T>(nValue);
         if (!mbClamp || nSample != nSample)
             return nSample;
         return std::max(std::min(nSample, oRow.moHighest[nAt]), oRow.moLowest[nAt]);
@@ -228,9 +230,11 @@ private:
 
 std::unique_ptr<ILevelReducer> MakeKernelReducer(const SourceForm& oForm, const LevelTask& oTask, Resampling eMethod)
 {
-    return ForSampleType(oForm.moType,
-                         [&](auto nSample) -> std::unique_ptr<ILevelReducer>
-                         { return std::make_unique<KernelReducer<decltype(nSample)>>(oForm, oTask, eMethod); });
+    const auto Make = [&]<class T>(std::type_identity<T>) -> std::unique_ptr<ILevelReducer>
+    {
+        return std::make_unique<KernelReducer<T>>(oForm, oTask, eMethod);
+    };
+    return krv::gobs::VisitPartType(oForm.moType, Make);
 }
 
 } // namespace krv::datasources::detail

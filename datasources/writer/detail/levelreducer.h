@@ -98,37 +98,4 @@ unsigned int GetKernelRadius(Resampling eMethod);
 // The pixels of the image that a part of a level depends on.
 PixelBounds GetSourceBounds(const SourceForm& oForm, const LevelTask& oTask, Resampling eMethod);
 
-// Calls oAction with a value of the sample type: of one part for complex types.
-template <typename Action>
-auto ForSampleType(const krv::gobs::DataType& oType, const Action& oAction)
-{
-    switch (oType.GetNativeCode())
-    {
-    case krv::gobs::eDT_8U:
-        return oAction(std::uint8_t{});
-    case krv::gobs::eDT_8S:
-        return oAction(std::int8_t{});
-    case krv::gobs::eDT_16U:
-    case krv::gobs::eDT_C16U:
-        return oAction(std::uint16_t{});
-    case krv::gobs::eDT_16S:
-    case krv::gobs::eDT_C16S:
-        return oAction(std::int16_t{});
-    case krv::gobs::eDT_32U:
-        return oAction(std::uint32_t{});
-    case krv::gobs::eDT_32S:
-    case krv::gobs::eDT_C32S:
-        return oAction(std::int32_t{});
-    case krv::gobs::eDT_64U:
-        return oAction(std::uint64_t{});
-    case krv::gobs::eDT_64S:
-        return oAction(std::int64_t{});
-    case krv::gobs::eDT_32R:
-    case krv::gobs::eDT_C32R:
-        return oAction(float{});
-    default:
-        return oAction(double{});
-    }
-}
-
 } // namespace krv::datasources::detail

@@ -1,7 +1,6 @@
 #pragma once
 
 #include <algorithm>
-#include <cmath>
 #include <concepts>
 #include <cstdint>
 #include <limits>
@@ -61,23 +60,6 @@ inline T MeanOf(Sum nSum, std::uint64_t nCount)
         if (nRest > nAbove || (nRest == nAbove && (nQuotient & 1) != 0))
             ++nQuotient;
         return static_cast<T>(nQuotient);
-    }
-}
-
-// Rounds half to even and saturates; NaN becomes 0 in integers.
-template <typename T, typename Real>
-inline T SampleOf(Real nValue)
-{
-    using Limits = std::numeric_limits<T>;
-    if constexpr (std::floating_point<T>)
-        return static_cast<T>(nValue);
-    else
-    {
-        const Real nRounded = std::rint(nValue);
-        constexpr Real END = static_cast<Real>(Limits::max() / 2 + 1) * 2;
-        if (!(nRounded < END))
-            return nRounded >= END ? Limits::max() : T(0);
-        return nRounded < static_cast<Real>(Limits::min()) ? Limits::min() : static_cast<T>(nRounded);
     }
 }
 

@@ -9,6 +9,7 @@
 #include "gobs/mask/exactmaskdecision.h"
 #include "gobs/mask/mask.h"
 #include "gobs/mask/samplematch.h"
+#include "gobs/raster/pixelvalue.h"
 #include "toolkit/nspio/warning.h"
 
 #include <algorithm>
@@ -321,15 +322,14 @@ void SampleValidity::AddChannels(const AuxiliaryData& oMetadata, const krv::gobs
 {
     if (!oType.IsComplex())
     {
-        mpoTest = ForSampleType(oType,
-                                [&](auto nSample) -> std::unique_ptr<ISampleTest>
-                                {
-                                    using T = decltype(nSample);
-                                    const auto oRules = MakeRules<T>(oMetadata, oMetadata.GetChannelCount(), bNaN);
-                                    const bool bAny = std::any_of(oRules.begin(), oRules.end(),
-                                                                  [](const auto& oRule) { return oRule.mbNoData; });
-                                    return bAny ? std::make_unique<SampleTest<T>>(oRules) : nullptr;
-                                });
+        const auto Make = [&]<class T>(std::type_identity<T>) -> std::unique_ptr<ISampleTest>
+        {
+            const auto oRules = MakeRules<T>(oMetadata, oMetadata.GetChannelCount(), bNaN);
+            const bool bAny =
+                std::any_of(oRules.begin(), oRules.end(), [](const auto& oRule) { return oRule.mbNoData; });
+            return bAny ? std::make_unique<SampleTest<T>>(oRules) : nullptr;
+        };
+        mpoTest = krv::gobs::VisitPartType(oType, Make);
         return;
     }
     for (unsigned int nChannel = 1; nChannel <= oMetadata.GetChannelCount(); ++nChannel)
@@ -430,15 +430,16 @@ std::unique_ptr<IValueFinisher> MakeValueFinisher(const AuxiliaryData& oMetadata
 {
     if (!oForm.mbValidity)
         return nullptr;
-    return ForSampleType(oForm.moType,
-                         [&](auto nSample) -> std::unique_ptr<IValueFinisher>
-                         {
-                             using T = decltype(nSample);
-                             const auto oRules = MakeRules<T>(oMetadata, oForm.mnChannels, bNaNIsNoData);
-                             if (oForm.moType.IsComplex())
-                                 return std::make_unique<ComplexFinisher<T>>(oRules);
-                             return std::make_unique<ValueFinisher<T>>(oRules);
-                         });
+    const auto Make = [&]<class Value>(std::type_identity<Value>) -> std::unique_ptr<IValueFinisher>
+    {
+        using T = krv::gobs::PartOf<Value>;
+        auto oRules = MakeRules<T>(oMetadata, oForm.mnChannels, bNaNIsNoData);
+        if constexpr (krv::gobs::PARTS_OF<Value> == 2)
+            return std::make_unique<ComplexFinisher<T>>(std::move(oRules));
+        else
+            return std::make_unique<ValueFinisher<T>>(oRules);
+    };
+    return krv::gobs::VisitPixelType(oForm.moType, Make);
 }
 
 } // namespace krv::datasources::detail

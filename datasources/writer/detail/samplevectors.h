@@ -1,17 +1,15 @@
 #pragma once
 
+#include "gobs/raster/pixelvalue.h"
+
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
-#include <type_traits>
 
 namespace krv::datasources::detail
 {
 
-template <typename T>
-using BitsOf = std::conditional_t<sizeof(T) == 1, std::uint8_t,
-                                  std::conditional_t<sizeof(T) == 2, std::uint16_t,
-                                                     std::conditional_t<sizeof(T) == 4, std::uint32_t, std::uint64_t>>>;
+using krv::gobs::BitsOf;
 
 // Vectors of the compiler, such as every processor has: of samples, of numbers as wide as they are, of as many bytes.
 template <typename T>

@@ -2,6 +2,7 @@
 
 #include "gobs/mask/detail/backgroundkernel.h"
 #include "gobs/mask/detail/bitkernel.h"
+#include "gobs/raster/pixelvalue.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -101,44 +102,41 @@ template <class Sample>
 using ValueAndNaN = std::optional<std::pair<Sample, bool>>;
 
 // Integers, and pairs of them, are compared by their bits.
-template <class Bits, class Integer>
+template <class Value>
 std::unique_ptr<IMaskDecisionImpl> MakeInteger(const BackgroundRule& oRule, unsigned long long nChannels)
 {
+    using Bits = BitsOf<Value>;
     const auto oConvert = [](const SampleValue& oValue) -> ValueAndNaN<Bits>
     {
-        const std::optional<Integer> oSample = ToSample<Integer>(oValue);
+        const auto oSample = ToSample<PartOf<Value>>(oValue);
         if (!oSample)
             return std::nullopt;
-        if constexpr (sizeof(Bits) == sizeof(Integer))
+        if constexpr (PARTS_OF<Value> == 1)
             return std::pair(std::bit_cast<Bits>(*oSample), false);
         else
-            return std::pair(std::bit_cast<Bits>(Complex<Integer>{*oSample, 0}), false);
+            return std::pair(std::bit_cast<Bits>(Value{*oSample, 0}), false);
     };
     return Make<BackgroundKernel<Bits>, Bits>(oRule, nChannels, oConvert);
 }
 
-template <class Real>
-std::unique_ptr<IMaskDecisionImpl> MakeReal(const BackgroundRule& oRule, unsigned long long nChannels, bool bComplex)
+template <class Value>
+std::unique_ptr<IMaskDecisionImpl> MakeReal(const BackgroundRule& oRule, unsigned long long nChannels)
 {
+    using Real = PartOf<Value>;
     // A NaN to compare with matches nothing by itself.
-    const auto oConvert = [&](const SampleValue& oValue) -> ValueAndNaN<Real>
+    const auto oConvert = [&](const SampleValue& oValue) -> ValueAndNaN<Value>
     {
         const std::optional<Real> oSample = ToSample<Real>(oValue);
         const bool bNaN = oValue.IsNaN() || oRule.mbNaNIsBackground;
         if (!oSample && !bNaN)
             return std::nullopt;
-        return std::pair(oSample.value_or(std::numeric_limits<Real>::quiet_NaN()), bNaN);
+        const Real nReal = oSample.value_or(std::numeric_limits<Real>::quiet_NaN());
+        if constexpr (PARTS_OF<Value> == 1)
+            return std::pair(nReal, bNaN);
+        else
+            return std::pair(Value{nReal, IsNaN(nReal) ? nReal : Real(0)}, bNaN);
     };
-    if (!bComplex)
-        return Make<BackgroundKernel<Real>, Real>(oRule, nChannels, oConvert);
-    const auto oConvertBoth = [&](const SampleValue& oValue) -> ValueAndNaN<Complex<Real>>
-    {
-        const ValueAndNaN<Real> oPart = oConvert(oValue);
-        if (!oPart)
-            return std::nullopt;
-        return std::pair(Complex<Real>{oPart->first, IsNaN(oPart->first) ? oPart->first : Real(0)}, oPart->second);
-    };
-    return Make<BackgroundKernel<Complex<Real>>, Complex<Real>>(oRule, nChannels, oConvertBoth);
+    return Make<BackgroundKernel<Value>, Value>(oRule, nChannels, oConvert);
 }
 
 std::unique_ptr<IMaskDecisionImpl> MakeBits(const BackgroundRule& oRule, unsigned long long nChannels)
@@ -168,42 +166,16 @@ void CheckDecision(BkgdRule eRule, std::size_t nValues, std::size_t nChannels, c
 std::unique_ptr<IMaskDecisionImpl> MakeBackgroundTest(const BackgroundRule& oRule, const DataType& oType,
                                                       unsigned long long nChannels, const Place& oPlace)
 {
-    switch (oType.GetNativeCode(oPlace))
+    if (oType == eDT_BIT)
+        return MakeBits(oRule, nChannels);
+    const auto MakeTest = [&]<class Value>(std::type_identity<Value>)
     {
-    case eDT_8U:
-        return MakeInteger<std::uint8_t, std::uint8_t>(oRule, nChannels);
-    case eDT_8S:
-        return MakeInteger<std::uint8_t, std::int8_t>(oRule, nChannels);
-    case eDT_16U:
-        return MakeInteger<std::uint16_t, std::uint16_t>(oRule, nChannels);
-    case eDT_16S:
-        return MakeInteger<std::uint16_t, std::int16_t>(oRule, nChannels);
-    case eDT_32U:
-        return MakeInteger<std::uint32_t, std::uint32_t>(oRule, nChannels);
-    case eDT_32S:
-        return MakeInteger<std::uint32_t, std::int32_t>(oRule, nChannels);
-    case eDT_64U:
-        return MakeInteger<std::uint64_t, std::uint64_t>(oRule, nChannels);
-    case eDT_64S:
-        return MakeInteger<std::uint64_t, std::int64_t>(oRule, nChannels);
-    case eDT_C16U:
-        return MakeInteger<std::uint32_t, std::uint16_t>(oRule, nChannels);
-    case eDT_C16S:
-        return MakeInteger<std::uint32_t, std::int16_t>(oRule, nChannels);
-    case eDT_C32S:
-        return MakeInteger<std::uint64_t, std::int32_t>(oRule, nChannels);
-    case eDT_32R:
-        return MakeReal<float>(oRule, nChannels, false);
-    case eDT_64R:
-        return MakeReal<double>(oRule, nChannels, false);
-    case eDT_C32R:
-        return MakeReal<float>(oRule, nChannels, true);
-    case eDT_C64R:
-        return MakeReal<double>(oRule, nChannels, true);
-    case eDT_BIT:
-        break;
-    }
-    return MakeBits(oRule, nChannels);
+        if constexpr (std::is_floating_point_v<PartOf<Value>>)
+            return MakeReal<Value>(oRule, nChannels);
+        else
+            return MakeInteger<Value>(oRule, nChannels);
+    };
+    return VisitPixelType(oType, MakeTest, oPlace);
 }
 
 } // namespace krv::gobs::detail

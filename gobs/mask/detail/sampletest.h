@@ -1,7 +1,7 @@
 #pragma once
 
-#include "gobs/mask/detail/complex.h"
 #include "gobs/mask/samplematch.h"
+#include "gobs/raster/complex.h"
 
 #include <cmath>
 #include <type_traits>

@@ -4,7 +4,7 @@
 #if !defined(__AVX512VBMI__)
 #error "This file is compiled for AVX-512 alone; the caller asks the processor first."
 #endif
-#include "gobs/mask/detail/complex.h"
+#include "gobs/raster/complex.h"
 
 #include <cstdint>
 #include <cstring>

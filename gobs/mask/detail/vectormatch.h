@@ -1,8 +1,8 @@
 #pragma once
 
-#include "gobs/mask/detail/complex.h"
 #include "gobs/mask/detail/vectormark.h"
 #include "gobs/mask/detail/vectorops.h"
+#include "gobs/raster/complex.h"
 
 #include <cstring>
 #include <type_traits>

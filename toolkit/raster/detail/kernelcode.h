@@ -4,6 +4,7 @@
 // everything here is local to the file and calls nothing that is not: a function that the linker shares could be the
 // other file's. Loops are plain and free of branches; the compiler makes vectors of them.
 
+#include "toolkit/raster/convertvalue.h"
 #include "toolkit/raster/detail/kernels.h"
 #include "toolkit/raster/detail/roundvectors.h"
 
@@ -21,49 +22,6 @@ namespace krv::raster::detail
 
 namespace
 {
-
-template <typename TTarget, typename TSource>
-inline TTarget ClampInteger(TSource nValue)
-{
-    using Source = std::numeric_limits<TSource>;
-    using Target = std::numeric_limits<TTarget>;
-    constexpr bool BELOW = std::is_signed_v<TSource> && (!std::is_signed_v<TTarget> || Source::digits > Target::digits);
-    if constexpr (BELOW)
-    {
-        constexpr TSource LOWEST = static_cast<TSource>(Target::min());
-        nValue = nValue < LOWEST ? LOWEST : nValue;
-    }
-    if constexpr (Source::digits > Target::digits)
-    {
-        constexpr TSource MOST = static_cast<TSource>(Target::max());
-        nValue = nValue > MOST ? MOST : nValue;
-    }
-    return static_cast<TTarget>(nValue);
-}
-
-template <typename TTarget, typename TSource>
-inline TTarget RoundInteger(TSource nValue)
-{
-    using Limits = std::numeric_limits<TTarget>;
-    // 2 to the number of magnitude bits: the first whole number above the type, exact in both real types.
-    constexpr TSource END = static_cast<TSource>(Limits::max() / 2 + 1) * 2;
-    constexpr TSource LOWEST = static_cast<TSource>(Limits::min());
-    const TSource nRounded = static_cast<TSource>(__builtin_rint(nValue));
-    if (!(nRounded < END))
-        return nRounded >= END ? Limits::max() : TTarget(0);
-    return nRounded < LOWEST ? Limits::min() : static_cast<TTarget>(nRounded);
-}
-
-template <typename TTarget, typename TSource>
-inline TTarget ConvertValue(TSource nValue)
-{
-    if constexpr (std::is_floating_point_v<TTarget>)
-        return static_cast<TTarget>(nValue);
-    else if constexpr (std::is_integral_v<TSource>)
-        return ClampInteger<TTarget>(nValue);
-    else
-        return RoundInteger<TTarget>(nValue);
-}
 
 template <typename TSource, typename TTarget>
 inline void ConvertPlain(const unsigned char* __restrict pSource, unsigned char* __restrict pTarget, std::size_t nFirst,

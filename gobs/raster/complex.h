@@ -1,6 +1,6 @@
 #pragma once
 
-namespace krv::gobs::detail
+namespace krv::gobs
 {
 
 // A complex value as it lies in a buffer.
@@ -13,4 +13,4 @@ struct Complex
     friend bool operator==(const Complex&, const Complex&) = default;
 };
 
-} // namespace krv::gobs::detail
+} // namespace krv::gobs

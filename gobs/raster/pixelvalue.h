@@ -1,0 +1,98 @@
+#pragma once
+
+#include "gobs/api.h"
+#include "gobs/raster/complex.h"
+#include "gobs/raster/datatype.h"
+
+#include <cstdint>
+#include <tuple>
+#include <type_traits>
+
+namespace krv::gobs
+{
+
+// The C++ type of one value of each pixel type, in the order of NativeDataTypeCode; one-bit values, which follow, have
+// none.
+using PixelValues = std::tuple<std::uint8_t, std::int8_t, std::uint16_t, std::int16_t, std::uint32_t, std::int32_t,
+                               float, std::uint64_t, std::int64_t, double, Complex<std::uint16_t>,
+                               Complex<std::int16_t>, Complex<std::int32_t>, Complex<float>, Complex<double>>;
+
+namespace detail
+{
+
+template <class Value>
+struct PartsOfValue
+{
+    using Part = Value;
+    static constexpr unsigned int COUNT = 1;
+};
+template <class PartOfValue>
+struct PartsOfValue<Complex<PartOfValue>>
+{
+    using Part = PartOfValue;
+    static constexpr unsigned int COUNT = 2;
+};
+
+template <class Value, class... Values>
+constexpr NativeDataTypeCode FindPixelType(std::type_identity<std::tuple<Values...>>)
+{
+    static_assert((std::is_same_v<Value, Values> || ...), "no pixel type has such values");
+    int nCode = 0;
+    static_cast<void>(((std::is_same_v<Value, Values> || (++nCode, false)) || ...));
+    return static_cast<NativeDataTypeCode>(nCode);
+}
+
+template <class Visitor, class... Values>
+decltype(auto) VisitValue(NativeDataTypeCode eType, const Visitor& oVisitor, std::type_identity<std::tuple<Values...>>)
+{
+    using Result = std::invoke_result_t<const Visitor&, std::type_identity<std::uint8_t>>;
+    constexpr Result (*CALLS[])(const Visitor&) = {[](const Visitor& oCalled) -> Result
+                                                   {
+                                                       return oCalled(std::type_identity<Values>());
+                                                   }...};
+    return CALLS[eType](oVisitor);
+}
+
+// The type's code. Throws DataException for one-bit values and for a type outside the table.
+KRV_GOBS_API NativeDataTypeCode GetValueType(const DataType& oType, const Place& oPlace);
+
+} // namespace detail
+
+// What a value is made of: the type and the number of its parts, 2 of a complex value and else 1.
+template <class Value>
+using PartOf = typename detail::PartsOfValue<Value>::Part;
+template <class Value>
+inline constexpr unsigned int PARTS_OF = detail::PartsOfValue<Value>::COUNT;
+
+// The pixel type whose values are of a C++ type. Does not compile for other types.
+template <class Value>
+inline constexpr NativeDataTypeCode
+    PIXEL_TYPE_OF = detail::FindPixelType<std::remove_const_t<Value>>(std::type_identity<PixelValues>());
+
+// The unsigned integer of as many bytes as a value, 1, 2, 4 or 8.
+template <class Value>
+using BitsOf =
+    std::conditional_t<sizeof(Value) == 1, std::uint8_t,
+                       std::conditional_t<sizeof(Value) == 2, std::uint16_t,
+                                          std::conditional_t<sizeof(Value) == 4, std::uint32_t, std::uint64_t>>>;
+
+// Calls oVisitor(std::type_identity<Value>()) with the C++ type of one value of a pixel type and gives what that gives,
+// which is of one type for all of them. Throws DataException for one-bit values and for a type outside the table.
+template <class Visitor>
+decltype(auto) VisitPixelType(const DataType& oType, const Visitor& oVisitor, const Place& oPlace = Place::Current())
+{
+    return detail::VisitValue(detail::GetValueType(oType, oPlace), oVisitor, std::type_identity<PixelValues>());
+}
+
+// The same with the type of one part, for work that takes complex values apart.
+template <class Visitor>
+decltype(auto) VisitPartType(const DataType& oType, const Visitor& oVisitor, const Place& oPlace = Place::Current())
+{
+    return VisitPixelType(
+        oType,
+        [&]<class Value>(std::type_identity<Value>) -> decltype(auto)
+        { return oVisitor(std::type_identity<PartOf<Value>>()); },
+        oPlace);
+}
+
+} // namespace krv::gobs
