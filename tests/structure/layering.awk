@@ -5,9 +5,9 @@
 BEGIN {
     # The order of the layers; includes go to a smaller number or stay in the folder.
     split("toolkit gobs datasources/api.h datasources/interfaces datasources/metadata datasources/iomanager " \
-          "datasources/reader datasources/writer datasources/maskbuilder datasources/datasets", order, " ");
+          "datasources/reader datasources/writer datasources/maskbuilder datasources/datasets operations", order, " ");
     for (n in order)
-        rank[order[n]] = n;
+        rank[order[n]] = n + 0; # the subscripts of an array are texts
     rank["datasources/formatregistrar"] = rank["datasources/reader"];
     rank["datasources/utils"] = rank["datasources/datasets"];
 
@@ -25,8 +25,9 @@ BEGIN {
     home["^boost/"] = "^datasources/metadata/";
     home["^(proj\\.h|proj/)"] = "^toolkit/ogc/cs/";
     home["^(tiff|tiffio|geotiff|geo_|geokeys|geovalues|xtiffio)"] = "^(plugins/tif|tools/samplescene)/";
-    home["^(libdeflate|zstd|zlib)\\.h"] = "^(plugins/support|plugins/tif|tools/krv)/";
-    home["^(fmt|CLI|nlohmann)/|^png\\.h"] = "^tools/";
+    home["^(libdeflate|zstd|zlib)\\.h"] = "^(plugins/support|plugins/tif|operations)/";
+    home["^(CLI|nlohmann)/"] = "^tools/";
+    home["^fmt/|^png\\.h"] = "^(operations|tools)/";
     # Their traces in public headers, which everybody who includes them has to have installed.
     split("toolkit/xml/xmldocument.h toolkit/xml/xmlutil.h datasources/iomanager/xalanselect.h", names, " ");
     for (n in names)
@@ -36,7 +37,7 @@ BEGIN {
 function folder(path,    parts, count)
 {
     count = split(path, parts, "/");
-    if (parts[1] == "toolkit" || parts[1] == "gobs")
+    if (parts[1] == "toolkit" || parts[1] == "gobs" || parts[1] == "operations")
         return parts[1];
     return count < 2 ? parts[1] : parts[1] "/" parts[2];
 }
@@ -72,10 +73,10 @@ function checkOwn(target)
         complain("no such file from the root: " target);
     close(root "/" target);
     if (match(target, /(^|\/)detail\//)) {
-        owner = target ~ /^(toolkit|gobs|datasources)\// ? substr(target, 1, index(target, "/")) : substr(target, 1, RSTART);
+        owner = target ~ /^(toolkit|gobs|datasources|operations)\// ? substr(target, 1, index(target, "/")) : substr(target, 1, RSTART);
         if (index(FILENAME, owner) != 1)
             complain(target " is private to " owner);
-        else if (FILENAME ~ /\.h$/ && FILENAME !~ /\/detail\// && FILENAME ~ /^(toolkit|gobs|datasources)\//)
+        else if (FILENAME ~ /\.h$/ && FILENAME !~ /\/detail\// && FILENAME ~ /^(toolkit|gobs|datasources|operations)\//)
             complain("a public header does not include the private " target);
     }
 }
@@ -98,7 +99,7 @@ function checkForeign(target,    library)
             continue;
         if (FILENAME !~ home[library])
             complain("<" target "> is not for this folder");
-        else if (FILENAME ~ /\.h$/ && FILENAME !~ /\/detail\// && FILENAME ~ /^(toolkit|gobs|datasources)\// &&
+        else if (FILENAME ~ /\.h$/ && FILENAME !~ /\/detail\// && FILENAME ~ /^(toolkit|gobs|datasources|operations)\// &&
                  !(FILENAME in mayShow))
             complain("a public header does not show <" target ">");
     }

@@ -24,9 +24,11 @@ put datasources/metadata/nodatavalue.cpp '#include "datasources/reader/reader.h"
 put datasources/formatregistrar/registrar.h
 put datasources/iomanager/datasetmanager.cpp '#include "datasources/formatregistrar/registrar.h"'
 put datasources/reader/reader.h '#include "datasources/metadata/tags.h"'
+put operations/statistics/job.cpp '#include "operations/statistics/job.h"' '#include <fmt/format.h>'
+put operations/statistics/job.h '#include "datasources/reader/reader.h"'
 put plugins/support/base.h '#include "datasources/metadata/tags.h"'
 put plugins/abc/abc.h '#include "plugins/support/base.h"'
-put tools/krv/main.cpp '#include "datasources/reader/reader.h"' '#include <fmt/format.h>'
+put tools/krv/main.cpp '#include "operations/statistics/job.h"' '#include <fmt/format.h>'
 "$oHere/layering.sh" "$oTree" || { echo "a clean tree is refused" >&2; exit 1; }
 
 # fault FILE LINE: alone in the clean tree, it must be found in that file.
@@ -51,6 +53,11 @@ fault datasources/metadata/other.cpp '#include "datasources/reader/reader.h"'
 fault datasources/metadata/upward.h '#include "datasources/reader/reader.h"'
 fault datasources/reader/beside.cpp '#include "datasources/formatregistrar/registrar.h"'
 fault datasources/reader/plug.cpp '#include "plugins/abc/abc.h"'
+fault datasources/reader/job.cpp '#include "operations/statistics/job.h"'
+fault operations/statistics/up.cpp '#include "tools/krv/main.h"'
+fault operations/statistics/json.cpp '#include <nlohmann/json.hpp>'
+fault operations/statistics/shown.h '#include <fmt/format.h>'
+fault plugins/abc/job.cpp '#include "operations/statistics/job.h"'
 fault plugins/abc/up.cpp '#include "datasources/reader/reader.h"'
 fault plugins/xyz/beside.cpp '#include "plugins/abc/abc.h"'
 fault plugins/support/up.cpp '#include "plugins/abc/abc.h"'

@@ -13,12 +13,11 @@
 #include "gobs/mask/mask.h"
 #include "gobs/mask/samplematch.h"
 #include "gobs/raster/raster.h"
+#include "operations/statistics/statistics.h"
 #include "tests/tools/programrun.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "tools/conformance/tempfolder.h"
-#include "tools/krv/progress.h"
 #include "tools/krv/reduction.h"
-#include "tools/krv/statistics.h"
 
 #include <gtest/gtest.h>
 
@@ -127,7 +126,7 @@ void ExpectMargins(IRasterReader& oSource, const AuxiliaryData& oRecord, bool bH
 
 void ExpectPicture(IRasterReader& oReader, const SampleValue& oValue, const std::string& background)
 {
-    Progress oProgress("test", 1);
+    operations::ProgressCounter oProgress({}, "test", 1);
     const Plane oPlane =
         Reduce(oReader, {oValue}, oReader.GetWidth(), oReader.GetHeight(), Reduction::eNearest, oProgress).front();
     for (std::size_t n = 0; n < background.size(); ++n)
@@ -177,7 +176,7 @@ TEST(Validity, EverybodySaysTheSameOfAValue)
                 cBit = cBit == '1' ? '0' : '1';
             EXPECT_EQ(BitsOf(new ValiditySource(oWriter.GetDataset()), oImage), valid);
 
-            const auto poGatherer = StatisticsGatherer::Make(oType, oValue);
+            const auto poGatherer = operations::StatisticsGatherer::Make(oType, oValue);
             poGatherer->Add(oImage.GetBuffer(), background.size(), 1);
             EXPECT_EQ(poGatherer->Get().noData, std::count(background.begin(), background.end(), '1'));
             ExpectPicture(oWriter, oValue, background);

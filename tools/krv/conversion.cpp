@@ -29,6 +29,8 @@
 namespace krv::tool
 {
 
+using namespace krv::operations;
+
 using namespace krv::datasources;
 
 namespace
@@ -119,15 +121,15 @@ void CopyChannels(const CopyPlan& oPlan, const Target& oTarget)
 {
     const auto& oChannels = oPlan.GetChannels();
     std::vector<krv::gobs::DataType> oTypes = oPlan.GetTypes();
-    Progress oProgress("convert",
-                       [&]
-                       {
-                           std::uint64_t nBytes = 0;
-                           for (const auto& oType : oTypes)
-                               nBytes +=
-                                   krv::gobs::BufferBytes(oPlan.GetWindow().width, oPlan.GetWindow().height, 1, oType);
-                           return nBytes;
-                       }());
+    operations::ProgressCounter oProgress(ShowProgress(), "convert",
+                                          [&]
+                                          {
+                                              std::uint64_t nBytes = 0;
+                                              for (const auto& oType : oTypes)
+                                                  nBytes += krv::gobs::BufferBytes(oPlan.GetWindow().width,
+                                                                                   oPlan.GetWindow().height, 1, oType);
+                                              return nBytes;
+                                          }());
     std::sort(oTypes.begin(), oTypes.end());
     oTypes.erase(std::unique(oTypes.begin(), oTypes.end()), oTypes.end());
     for (const krv::gobs::DataType& oType : oTypes)
@@ -172,7 +174,7 @@ unsigned int CopyBitmap(IBitmapDataset& oFrom, unsigned int nFrom, IBitmapDatase
         oTo.SetBitmapMetadata(nTo, oTags);
     BasicReader oReader(&oFrom, {nFrom}, false);
     BasicWriter oWriter(&oTo, {nTo});
-    Progress oProgress("bitmap", std::uint64_t{oWindow.width} * oWindow.height);
+    operations::ProgressCounter oProgress(ShowProgress(), "bitmap", std::uint64_t{oWindow.width} * oWindow.height);
     CopyPixels({{&oReader, {0}}}, oWriter, oWindow, oProgress);
     return nTo;
 }

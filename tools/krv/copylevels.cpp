@@ -22,6 +22,8 @@
 namespace krv::tool
 {
 
+using namespace krv::operations;
+
 using namespace krv::datasources;
 
 namespace
@@ -143,8 +145,9 @@ private:
         std::vector<unsigned int> oPositions(moChannels.size());
         for (unsigned int nAt = 0; nAt < oPositions.size(); ++nAt)
             oPositions[nAt] = nAt;
-        Progress oProgress("overviews", krv::gobs::BufferBytes(oAll.width, oAll.height, poWriter->GetChansCount(),
-                                                               poWriter->GetDataType()));
+        operations::ProgressCounter oProgress(
+            ShowProgress(), "overviews",
+            krv::gobs::BufferBytes(oAll.width, oAll.height, poWriter->GetChansCount(), poWriter->GetDataType()));
         CopyPixels({{&oReader.Get(), oPositions}}, *poWriter, oAll, oProgress);
     }
 
@@ -203,13 +206,11 @@ void BuildLevels(const Target& oTarget, const std::vector<unsigned int>& oLevels
         return;
     BasicWriter oWriter(&oTarget.GetRaster(), {});
     const std::uint64_t nPixelBytes = krv::gobs::BufferBytes(1, 1, oWriter.GetChansCount(), oWriter.GetDataType());
-    std::unique_ptr<Progress> poProgress;
+    const Progress oProgress = ShowProgress();
     OverviewOptions oOptions;
     oOptions.moProgress = [&](std::uint64_t nDone, std::uint64_t nTotal)
     {
-        if (poProgress == nullptr)
-            poProgress = std::make_unique<Progress>("overviews", nTotal * nPixelBytes);
-        poProgress->Advance(nDone * nPixelBytes - poProgress->GetDone());
+        Report(oProgress, {"overviews", nDone * nPixelBytes, nTotal * nPixelBytes});
         return true;
     };
     BuildOverviews(oWriter, oLevels, method, oOptions);
@@ -223,8 +224,9 @@ void MoveBlocks(const CopyPlan& oPlan, const Target& oTarget, unsigned int nLeve
     auto& oFrom = dynamic_cast<IEncodedBlocks&>(oSource.GetDataset());
     IEncodedBlocks& oTo = *oTarget.Find<IEncodedBlocks>();
     const EncodedForm oForm = oFrom.GetEncodedForm(nLevel);
-    Progress oProgress(nLevel == 1 ? "convert" : "overviews",
-                       krv::gobs::BufferBytes(oForm.mnWidth, oForm.mnHeight, oForm.mnChannels, oForm.moType));
+    operations::ProgressCounter oProgress(
+        ShowProgress(), nLevel == 1 ? "convert" : "overviews",
+        krv::gobs::BufferBytes(oForm.mnWidth, oForm.mnHeight, oForm.mnChannels, oForm.moType));
     std::vector<unsigned char> oBytes;
     const unsigned int nPlanes = oForm.mbSeparate ? oForm.mnChannels : 1;
     const unsigned int nColumns = DivideUp(oForm.mnWidth, oForm.mnBlockWidth);

@@ -18,6 +18,8 @@
 namespace krv::tool
 {
 
+using namespace krv::operations;
+
 using krv::datasources::IRasterReader;
 using krv::datasources::IRasterWriter;
 using krv::gobs::Raster;
@@ -111,7 +113,7 @@ void MakeMerger(const std::vector<CopySource>& oSources, const IRasterWriter& oW
 } // namespace
 
 void CopyPixels(const std::vector<CopySource>& oSources, IRasterWriter& oWriter, const PixelWindow& oWindow,
-                Progress& oProgress)
+                operations::ProgressCounter& oProgress)
 {
     if (oWriter.GetWidth() != oWindow.width || oWriter.GetHeight() != oWindow.height)
         throw krv::DataException(fmt::format("what was laid out with {} x {} pixels says to be of {} x {}",

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "gobs/raster/datatype.h"
+#include "operations/job/progress.h"
 #include "tools/krv/copyplan.h"
 
 #include <vector>
@@ -14,8 +15,6 @@ class IRasterWriter;
 namespace krv::tool
 {
 
-class Progress;
-
 // Channels that one reader serves, and where each goes in the pixels that are written.
 struct CopySource
 {
@@ -27,6 +26,6 @@ struct CopySource
 // target and are as large as blocks of the sources are, but at most 64 MiB. Values are converted to the writer's type.
 // Each position is filled by one source.
 void CopyPixels(const std::vector<CopySource>& oSources, krv::datasources::IRasterWriter& oWriter,
-                const PixelWindow& oWindow, Progress& oProgress);
+                const PixelWindow& oWindow, operations::ProgressCounter& oProgress);
 
 } // namespace krv::tool

@@ -3,10 +3,10 @@
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "gobs/mask/samplematch.h"
+#include "operations/source/pixeltypes.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 #include "tools/krv/errors.h"
-#include "tools/krv/pixeltypes.h"
 
 #include <fmt/format.h>
 
@@ -16,6 +16,8 @@
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 namespace
 {

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "gobs/raster/datatype.h"
-#include "tools/krv/sourcefile.h"
+#include "operations/source/sourcefile.h"
 
 #include <cstddef>
 #include <memory>
@@ -11,6 +11,8 @@
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 // A rectangle of pixels.
 struct PixelWindow

@@ -17,6 +17,8 @@
 namespace krv::tool
 {
 
+using namespace krv::operations;
+
 using krv::datasources::AuxiliaryData;
 using krv::datasources::DropStatistics;
 using krv::datasources::MetadataMap;

@@ -16,6 +16,8 @@
 namespace krv::tool
 {
 
+using namespace krv::operations;
+
 using namespace krv::datasources;
 using krv::gobs::Mask;
 using krv::gobs::Raster;
@@ -86,7 +88,8 @@ void WriteValidity(const CopyPlan& oPlan, const Target& oTarget, unsigned int nB
     }
     const std::vector<Part> oParts = FindParts(oPlan);
     BasicWriter oWriter(poBitmaps, {nBitmap});
-    Progress oProgress("mask", std::uint64_t{oWriter.GetWidth()} * oWriter.GetHeight());
+    operations::ProgressCounter oProgress(ShowProgress(), "mask",
+                                          std::uint64_t{oWriter.GetWidth()} * oWriter.GetHeight());
     krv::gobs::TileIterator oTiles(oWriter.GetWidth(), oWriter.GetHeight());
     oTiles.SetChunkSize(oWriter.GetTileWidth(), oWriter.GetTileHeight());
     for (unsigned int nTile = 0; nTile != oTiles.GetTileRange() + 1; ++nTile)

@@ -14,6 +14,7 @@
 #include "datasources/reader/basicreader.h"
 #include "gobs/pct/pct.h"
 #include "gobs/raster/raster.h"
+#include "operations/source/sourcefile.h"
 #include "toolkit/core/core.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/icrs.h"
@@ -31,6 +32,8 @@
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 using namespace krv::datasources;
 

@@ -7,9 +7,9 @@
 #include "datasources/metadata/referencetag.h"
 #include "datasources/reader/validitysource.h"
 #include "gobs/raster/datatype.h"
+#include "operations/source/pixeltypes.h"
+#include "operations/source/sourcefile.h"
 #include "tools/krv/errors.h"
-#include "tools/krv/pixeltypes.h"
-#include "tools/krv/sourcefile.h"
 
 #include <algorithm>
 #include <limits>
@@ -17,6 +17,8 @@
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 namespace
 {

@@ -1,5 +1,7 @@
 #pragma once
 
+#include "operations/source/sourcefile.h"
+
 #include "gobs/pct/pct.h"
 
 #include <memory>
@@ -9,7 +11,7 @@
 namespace krv::tool
 {
 
-class SourceFile;
+using namespace krv::operations;
 
 // Which channels of a file make a picture, and what belongs to them.
 struct DisplayChoice

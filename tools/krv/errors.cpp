@@ -1,15 +1,12 @@
 #include "tools/krv/errors.h"
 
 #include "datasources/formatregistrar/winformatregistrar.h"
+#include "operations/source/sourcefile.h"
 #include "toolkit/core/core.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/xml/xmlerror.h"
-#include "tools/krv/interrupt.h"
 
 #include <fmt/format.h>
-
-#include <sys/stat.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -65,7 +62,7 @@ std::string RegistryPath()
 
 std::string NotFoundText(const std::string& file)
 {
-    const std::string why = WhyUnreadable(file);
+    const std::string why = operations::WhyUnreadable(file);
     return file + ": " + (why.empty() ? "it cannot be opened; try again, or look with `krv doctor`" : why);
 }
 
@@ -190,14 +187,14 @@ std::string Describe(const std::string& file, const krv::Exception** ppError)
         *ppError = &oError;
         return LibraryText(oError);
     }
+    catch (const operations::StoppedException& oError)
+    {
+        return oError.what();
+    }
     catch (const krv::Exception& oError)
     {
         *ppError = &oError;
         return DataText(oError, file);
-    }
-    catch (const Stopped& oError)
-    {
-        return oError.what();
     }
     catch (const std::bad_alloc&)
     {
@@ -217,18 +214,7 @@ std::string Describe(const std::string& file, const krv::Exception** ppError)
 
 std::string CurrentMessage()
 {
-    try
-    {
-        throw;
-    }
-    catch (const std::exception& oError)
-    {
-        return OneLine(oError.what());
-    }
-    catch (...)
-    {
-        return OneLine(krv::xml::DescribeCurrentException());
-    }
+    return OneLine(operations::CurrentMessage());
 }
 
 std::string OneLine(const std::string& text)
@@ -253,24 +239,6 @@ std::string OneLine(const std::string& text)
     while (IsContinuation(line[nTail]))
         ++nTail;
     return line.substr(0, nHead) + " ... " + line.substr(nTail);
-}
-
-std::string WhyUnreadable(const std::string& file)
-{
-    struct stat oStatus = {};
-    if (stat(file.c_str(), &oStatus) != 0)
-    {
-        if (errno == ENOENT)
-            return "there is no such file; check the name and the folder";
-        return std::string("it cannot be reached: ") + std::strerror(errno);
-    }
-    if (S_ISDIR(oStatus.st_mode))
-        return "it is a folder; name a file in it";
-    if (!S_ISREG(oStatus.st_mode))
-        return "it is not a regular file; copy its content into one";
-    if (access(file.c_str(), R_OK) != 0)
-        return "it may not be read; ask its owner for the right to read it";
-    return {};
 }
 
 // The pointer from the inner handler stays valid: the caller's catch block holds the same exception.

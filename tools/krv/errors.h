@@ -1,17 +1,14 @@
 #pragma once
 
-#include <stdexcept>
+#include "operations/job/exceptions.h"
+
 #include <string>
 
 namespace krv::tool
 {
 
-// The command line asks for something that does not make sense.
-class UsageError : public std::runtime_error
-{
-public:
-    using std::runtime_error::runtime_error;
-};
+// The command line asks for something that does not make sense, by itself or for the file.
+using UsageError = krv::operations::RequestException;
 
 // What the exception that is being handled means to the user, on one line: file, cause, and what to do about it. To be
 // called in a catch block only. file: the file that the verb works on, for exceptions that name none.
@@ -24,9 +21,5 @@ std::string CurrentMessage();
 // The text as a terminal may show it: line breaks and tabs are blanks, other controls and bytes that are no UTF-8 are
 // written as \\x1b, and of a very long text the middle is left out.
 std::string OneLine(const std::string& text);
-
-// Why a file cannot be opened, from the operating system: "there is no such file", "it is a folder", ... ; empty when
-// nothing stands against it.
-std::string WhyUnreadable(const std::string& file);
 
 } // namespace krv::tool

@@ -15,18 +15,20 @@
 #include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/reader/irasterreader.h"
 #include "gobs/pct/pct.h"
+#include "operations/source/sourcefile.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 #include "toolkit/ogc/cs/icrs.h"
 #include "tools/krv/errors.h"
-#include "tools/krv/sourcefile.h"
 
 #include <memory>
 #include <optional>
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 using namespace krv::datasources;
 

@@ -1,11 +1,13 @@
 #pragma once
 
+#include "operations/source/sourcefile.h"
+
 #include "tools/krv/jsontext.h"
 
 namespace krv::tool
 {
 
-class SourceFile;
+using namespace krv::operations;
 
 // Everything known of a file, with the field names that `krv info --json` promises. Absent facts are null, absent lists
 // empty. A channel's no-data value is text, so that NaN and 64-bit integers stay what they are.

@@ -26,10 +26,9 @@ void WatchForInterrupt()
     sigaction(SIGTERM, &oAction, nullptr);
 }
 
-void CheckInterrupt()
+bool WasInterrupted()
 {
-    if (gnStopped != 0)
-        throw Stopped();
+    return gnStopped != 0;
 }
 
 } // namespace krv::tool

@@ -11,6 +11,8 @@
 namespace krv::tool
 {
 
+using namespace krv::operations;
+
 using krv::datasources::EncodedForm;
 
 namespace

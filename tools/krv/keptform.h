@@ -11,6 +11,8 @@
 namespace krv::tool
 {
 
+using namespace krv::operations;
+
 // How a file stores the blocks of its image or of a level; no value when its format does not say.
 std::optional<krv::datasources::EncodedForm> FindForm(const SourceFile& oSource, unsigned int nLevel = 1);
 

@@ -12,6 +12,7 @@
 #include "gobs/mask/mask.h"
 #include "gobs/raster/raster.h"
 #include "gobs/tile/tileiterator.h"
+#include "operations/source/sourcefile.h"
 #include "toolkit/core/gglshape.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "tools/krv/errors.h"
@@ -19,7 +20,6 @@
 #include "tools/krv/polygonplacer.h"
 #include "tools/krv/polygontext.h"
 #include "tools/krv/progress.h"
-#include "tools/krv/sourcefile.h"
 
 #include <fmt/format.h>
 
@@ -31,6 +31,8 @@
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 namespace
 {
@@ -296,7 +298,7 @@ MaskResult MakeMask(const std::string& file, const MaskRequest& oRequest)
     krv::gobs::TileIterator oTiles(nWidth, nHeight);
     oTiles.SetChunkSize(oGrid.Get().GetTileWidth(), oGrid.Get().GetTileHeight());
     MaskResult oResult;
-    Progress oProgress("mask", std::uint64_t{nWidth} * nHeight);
+    operations::ProgressCounter oProgress(ShowProgress(), "mask", std::uint64_t{nWidth} * nHeight);
     for (unsigned int i = 0; i != oTiles.GetTileRange() + 1; ++i)
     {
         const krv::gobs::Tile oTile = oTiles.GetTile(i);

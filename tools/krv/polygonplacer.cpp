@@ -20,6 +20,8 @@
 namespace krv::tool
 {
 
+using namespace krv::operations;
+
 namespace
 {
 

@@ -1,11 +1,11 @@
 #pragma once
 
+#include "operations/source/sourcefile.h"
 #include "toolkit/core/gglshape.h"
 #include "toolkit/ogc/cs/coordinatetransformation.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 #include "tools/krv/masking.h"
 #include "tools/krv/polygontext.h"
-#include "tools/krv/sourcefile.h"
 
 #include <cstddef>
 #include <optional>
@@ -13,6 +13,8 @@
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 // Takes polygons to the pixels of a file. Edges are straight in the system the polygons are given in. On the way to
 // another system they are clipped to the surroundings of the image, so that parts which no projection reaches do no

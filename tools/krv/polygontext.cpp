@@ -1,5 +1,6 @@
 #include "tools/krv/polygontext.h"
 
+#include "operations/source/sourcefile.h"
 #include "toolkit/nspio/warning.h"
 #include "tools/krv/errors.h"
 
@@ -16,6 +17,8 @@
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 namespace
 {

@@ -8,6 +8,8 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <memory>
+#include <optional>
 
 namespace krv::tool
 {
@@ -50,36 +52,50 @@ std::string ProgressLine(const std::string& label, std::uint64_t nDone, std::uin
         .substr(0, 79);
 }
 
-Progress::Progress(std::string label, std::uint64_t nTotalBytes)
+ProgressBar::ProgressBar(std::string label, std::uint64_t nTotalBytes)
     : moLabel(std::move(label)), mnTotal(nTotalBytes), mbTerminal(isatty(STDERR_FILENO) == 1), moStart(Clock::now()),
       moNextDraw(moStart + FIRST_DRAW)
 {
 }
 
-Progress::~Progress()
+ProgressBar::~ProgressBar()
 {
     if (mbDrawn)
         std::fputs("\r\033[K", stderr);
 }
 
-void Progress::Advance(std::uint64_t nBytes)
+void ProgressBar::Show(std::uint64_t nDone)
 {
-    CheckInterrupt();
-    mnDone += nBytes;
     if (!mbTerminal)
         return;
     const auto oNow = Clock::now();
     if (oNow >= moNextDraw)
-        Draw(oNow);
+        Draw(oNow, nDone);
 }
 
-void Progress::Draw(Clock::time_point oNow)
+void ProgressBar::Draw(Clock::time_point oNow, std::uint64_t nDone)
 {
     moNextDraw = oNow + DRAW_INTERVAL;
     mbDrawn = true;
     const double nSeconds = std::chrono::duration<double>(oNow - moStart).count();
-    std::fprintf(stderr, "\r%s\033[K", ProgressLine(moLabel, mnDone, mnTotal, nSeconds).c_str());
+    std::fprintf(stderr, "\r%s\033[K", ProgressLine(moLabel, nDone, mnTotal, nSeconds).c_str());
     std::fflush(stderr);
+}
+
+operations::Progress ShowProgress()
+{
+    const auto poBar = std::make_shared<std::optional<ProgressBar>>();
+    return [poBar](const operations::Amount& oAmount)
+    {
+        if (WasInterrupted())
+            return false;
+        if (oAmount.done == 0 || !*poBar)
+            poBar->emplace(oAmount.part, oAmount.total);
+        (*poBar)->Show(oAmount.done);
+        if (oAmount.done >= oAmount.total)
+            poBar->reset();
+        return true;
+    };
 }
 
 } // namespace krv::tool

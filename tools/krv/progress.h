@@ -1,5 +1,7 @@
 #pragma once
 
+#include "operations/job/progress.h"
+
 #include <chrono>
 #include <cstdint>
 #include <string>
@@ -7,34 +9,33 @@
 namespace krv::tool
 {
 
-// How far a long job is: a bar with bytes, rate and time left on the standard error output, drawn only when that is a
-// terminal and not before half a second has passed. The line is cleared at the end.
-class Progress
+// A bar with bytes, rate and time left on the standard error output, drawn only when that is a terminal and not before
+// half a second has passed. The line is cleared at the end.
+class ProgressBar
 {
 public:
-    Progress(std::string label, std::uint64_t nTotalBytes);
-    Progress(const Progress&) = delete;
-    Progress& operator=(const Progress&) = delete;
-    ~Progress();
+    ProgressBar(std::string label, std::uint64_t nTotalBytes);
+    ProgressBar(const ProgressBar&) = delete;
+    ProgressBar& operator=(const ProgressBar&) = delete;
+    ~ProgressBar();
 
-    // Throws Stopped when the user asked for it.
-    void Advance(std::uint64_t nBytes);
-
-    std::uint64_t GetDone() const { return mnDone; }
+    void Show(std::uint64_t nDone);
 
 private:
     using Clock = std::chrono::steady_clock;
 
-    void Draw(Clock::time_point oNow);
+    void Draw(Clock::time_point oNow, std::uint64_t nDone);
 
     std::string moLabel;
     std::uint64_t mnTotal;
-    std::uint64_t mnDone = 0;
     bool mbTerminal;
     bool mbDrawn = false;
     Clock::time_point moStart;
     Clock::time_point moNextDraw;
 };
+
+// For a job: draws a bar for each of its parts, and stops it when the user asked for that.
+operations::Progress ShowProgress();
 
 // The bar's text without the control characters: at most 79 columns.
 std::string ProgressLine(const std::string& label, std::uint64_t nDone, std::uint64_t nTotal, double nSeconds);

@@ -6,11 +6,11 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/reader/basicreader.h"
 #include "gobs/pct/pct.h"
+#include "operations/source/sourcefile.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "tools/krv/displaychoice.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/progress.h"
-#include "tools/krv/sourcefile.h"
 
 #include <fmt/format.h>
 
@@ -21,6 +21,8 @@
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 namespace
 {
@@ -59,7 +61,7 @@ std::vector<Plane> ReadPlanes(const SourceFile& oFile, const std::vector<unsigne
         oReaders.push_back(oFile.ReadAtLeast(oGroup.channels, oSize.width, oSize.height));
         nBytes += ReaderBytes(oReaders.back().Get());
     }
-    Progress oProgress("view", nBytes);
+    operations::ProgressCounter oProgress(ShowProgress(), "view", nBytes);
     std::vector<Plane> oPlanes(oChannels.size());
     for (std::size_t g = 0; g < oGroups.size(); ++g)
     {
@@ -106,7 +108,7 @@ void ApplyMask(const SourceFile& oFile, unsigned int nBitmap, const Size& oSize,
     krv::datasources::BasicReader oReader(poBitmaps, {nBitmap}, false);
     if (oReader.GetWidth() != oFile.GetRaster().GetWidth() || oReader.GetHeight() != oFile.GetRaster().GetHeight())
         throw krv::DataException(fmt::format("{}: bitmap {} is not of the image's size", oFile.GetName(), nBitmap));
-    Progress oProgress("mask", ReaderBytes(oReader));
+    operations::ProgressCounter oProgress(ShowProgress(), "mask", ReaderBytes(oReader));
     const auto oPlanes = Reduce(oReader, {std::nullopt}, oSize.width, oSize.height, Reduction::eAverage, oProgress);
     Multiply(oOpacity, oPlanes.front(), 1.0F);
 }

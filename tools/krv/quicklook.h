@@ -1,5 +1,7 @@
 #pragma once
 
+#include "operations/source/sourcefile.h"
+
 #include "tools/krv/pngwriter.h"
 #include "tools/krv/stretch.h"
 
@@ -9,7 +11,7 @@
 namespace krv::tool
 {
 
-class SourceFile;
+using namespace krv::operations;
 
 struct QuickLookOptions
 {

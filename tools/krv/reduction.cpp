@@ -14,6 +14,8 @@
 namespace krv::tool
 {
 
+using namespace krv::operations;
+
 namespace
 {
 
@@ -231,7 +233,8 @@ std::unique_ptr<PlaneBuilder> MakeBuilder(const krv::gobs::DataType& oType, unsi
 } // namespace
 
 std::vector<Plane> Reduce(krv::datasources::IRasterReader& oReader, const std::vector<OptionalNoData>& oNoData,
-                          unsigned int nWidth, unsigned int nHeight, Reduction eReduction, Progress& oProgress)
+                          unsigned int nWidth, unsigned int nHeight, Reduction eReduction,
+                          operations::ProgressCounter& oProgress)
 {
     const Grid oGrid{{oReader.GetWidth(), nWidth, eReduction}, {oReader.GetHeight(), nHeight, eReduction}};
     std::vector<std::unique_ptr<PlaneBuilder>> oBuilders;

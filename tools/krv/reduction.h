@@ -1,6 +1,7 @@
 #pragma once
 
-#include "tools/krv/pixeltypes.h"
+#include "operations/job/progress.h"
+#include "operations/source/pixeltypes.h"
 
 #include <vector>
 
@@ -12,7 +13,7 @@ class IRasterReader;
 namespace krv::tool
 {
 
-class Progress;
+using namespace krv::operations;
 
 // One channel at the size of a quick look.
 struct Plane
@@ -33,7 +34,8 @@ enum class Reduction
 // order; holds sums for the rows of one row of tiles only. oNoData: one per channel.
 // Values that are no-data, not a number or infinite are not valid.
 std::vector<Plane> Reduce(krv::datasources::IRasterReader& oReader, const std::vector<OptionalNoData>& oNoData,
-                          unsigned int nWidth, unsigned int nHeight, Reduction eReduction, Progress& oProgress);
+                          unsigned int nWidth, unsigned int nHeight, Reduction eReduction,
+                          operations::ProgressCounter& oProgress);
 
 // Where pixel i of nTarget pixels starts among nSource pixels.
 inline unsigned int SourceStart(unsigned int i, unsigned int nSource, unsigned int nTarget)

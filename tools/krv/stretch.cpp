@@ -6,6 +6,8 @@
 namespace krv::tool
 {
 
+using namespace krv::operations;
+
 namespace
 {
 

@@ -17,6 +17,8 @@
 namespace krv::tool
 {
 
+using namespace krv::operations;
+
 using namespace krv::datasources;
 
 namespace

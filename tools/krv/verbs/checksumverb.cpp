@@ -1,8 +1,7 @@
-#include "datasources/reader/irasterreader.h"
-#include "tools/krv/checksums.h"
+#include "operations/checksum/checksums.h"
+#include "operations/source/sourcefile.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/progress.h"
-#include "tools/krv/sourcefile.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -26,34 +25,20 @@ struct Options
 
 int RunChecksum(const std::string& file, const Options& oOptions)
 {
-    const auto oWanted = ParseNumbers(oOptions.channels, "--channels");
-    const SourceFile oFile(file);
-    const auto oChannels = oFile.CheckChannels(oWanted);
+    const auto oChannels = ParseNumbers(oOptions.channels, "--channels");
+    const auto oSums =
+        operations::ComputeChecksums(operations::SourceFile(file), oChannels, oOptions.level, ShowProgress());
     Json oRows = Json::array();
-    oRows.get_ref<Json::array_t&>().resize(oChannels.size());
-    unsigned int nWidth = 0, nHeight = 0;
-    for (const ChannelGroup& oGroup : oFile.GroupByType(oChannels))
-    {
-        const LevelReader oReader = oFile.Read(oGroup.channels, oOptions.level);
-        nWidth = oReader.Get().GetWidth();
-        nHeight = oReader.Get().GetHeight();
-        const krv::gobs::DataType oType = oReader.Get().GetDataType();
-        Progress oProgress("checksum", krv::gobs::BufferBytes(nWidth, nHeight, oGroup.channels.size(), oType));
-        const auto oSums = ComputeChecksums(oReader.Get(), oProgress);
-        for (std::size_t i = 0; i < oSums.size(); ++i)
-            oRows[oGroup.positions[i]] = {
-                {"number", oGroup.channels[i]}, {"type", oType.Describe()}, {"crc32", fmt::format("{:08x}", oSums[i])}};
-    }
-    if (oOptions.json)
-    {
-        Print(ToText({{"file", file}, {"width", nWidth}, {"height", nHeight}, {"channels", oRows}}));
-        return 0;
-    }
     std::string text;
-    for (const Json& oRow : oRows)
-        text += fmt::format("{:>4}  {:<5} {}\n", oRow["number"].get<unsigned int>(), oRow["type"].get<std::string>(),
-                            oRow["crc32"].get<std::string>());
-    Print(text);
+    for (const operations::ChannelChecksum& oSum : oSums.channels)
+    {
+        const std::string type = oSum.type.Describe(), crc = fmt::format("{:08x}", oSum.crc32);
+        oRows.push_back({{"number", oSum.number}, {"type", type}, {"crc32", crc}});
+        text += fmt::format("{:>4}  {:<5} {}\n", oSum.number, type, crc);
+    }
+    Print(oOptions.json
+              ? ToText({{"file", file}, {"width", oSums.width}, {"height", oSums.height}, {"channels", oRows}})
+              : text);
     return 0;
 }
 

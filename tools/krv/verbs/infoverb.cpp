@@ -1,5 +1,5 @@
+#include "operations/source/sourcefile.h"
 #include "tools/krv/fileinfo.h"
-#include "tools/krv/sourcefile.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -8,6 +8,8 @@
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 namespace
 {

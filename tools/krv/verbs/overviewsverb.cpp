@@ -4,11 +4,11 @@
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/writer/basicwriter.h"
 #include "datasources/writer/overviewbuilder.h"
+#include "operations/source/sourcefile.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/progress.h"
-#include "tools/krv/sourcefile.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -19,6 +19,8 @@
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 namespace
 {
@@ -95,12 +97,10 @@ void Build(BasicWriter& oWriter, const std::vector<unsigned int>& oLevels, const
            OverviewOptions oOptions)
 {
     const std::uint64_t nPixelBytes = oWriter.GetDataType().GetValueBits() / 8 * oWriter.GetChansCount();
-    std::unique_ptr<Progress> poProgress;
+    const Progress oProgress = ShowProgress();
     oOptions.moProgress = [&](std::uint64_t nDone, std::uint64_t nTotal)
     {
-        if (poProgress == nullptr)
-            poProgress = std::make_unique<Progress>("overviews", nTotal * nPixelBytes);
-        poProgress->Advance(nDone * nPixelBytes - poProgress->GetDone());
+        Report(oProgress, {"overviews", nDone * nPixelBytes, nTotal * nPixelBytes});
         return true;
     };
     try

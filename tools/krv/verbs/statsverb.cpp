@@ -1,15 +1,13 @@
 #include "datasources/interfaces/irasterdataset.h"
-#include "datasources/reader/irasterreader.h"
-#include "datasources/reader/validitysource.h"
+#include "operations/source/sourcefile.h"
+#include "operations/statistics/statistics.h"
+#include "tools/krv/jsontext.h"
 #include "tools/krv/progress.h"
-#include "tools/krv/sourcefile.h"
-#include "tools/krv/statistics.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
 #include <fmt/format.h>
 
-#include <algorithm>
 #include <memory>
 
 namespace krv::tool
@@ -18,8 +16,6 @@ namespace krv::tool
 namespace
 {
 
-using krv::datasources::ValiditySource;
-
 struct Options
 {
     std::string channels;
@@ -27,50 +23,32 @@ struct Options
     bool json = false;
 };
 
-// What says which pixels are valid beside the values of their own channels; null when nothing does.
-std::unique_ptr<ValiditySource> FindValidity(const SourceFile& oFile, const std::vector<unsigned int>& oChannels)
+Json ToJson(const std::optional<operations::ExactNumber>& oNumber)
 {
-    const auto IsNone = [&oFile](unsigned int nChannel)
-    {
-        return !oFile.GetNoData(nChannel);
-    };
-    const auto IsUnread = [&](unsigned int nChannel)
-    {
-        return IsNone(nChannel) && !oFile.GetNoDataText(nChannel).empty();
-    };
-    const bool bUnread = std::any_of(oChannels.begin(), oChannels.end(), IsUnread);
-    auto poSource = std::make_unique<ValiditySource>(&oFile.GetDataset(), oChannels, krv::gobs::eAllChannels, !bUnread);
-    // A pixel without data in all channels that have a value is none in those that have not.
-    const bool bPixels = poSource->HasNoData() && std::any_of(oChannels.begin(), oChannels.end(), IsNone);
-    return poSource->HasBitmap() || poSource->HasAlpha() || bPixels ? std::move(poSource) : nullptr;
+    return oNumber ? std::visit([](auto nNumber) { return Json(nNumber); }, *oNumber) : Json();
 }
 
-// The alpha channel says which pixels are valid; it has no statistics of its own.
-Json AlphaToJson(unsigned int nChannel, const krv::gobs::DataType& oType)
+Json StatisticsToJson(const operations::ChannelStatistics& oStatistics)
 {
-    Json oRow = {{"number", nChannel}, {"type", oType.Describe()}, {"of", "alpha"}};
-    for (const char* pKey :
-         {"noDataValue", "min", "max", "mean", "stdDev", "valid", "noData", "masked", "nan", "infinite"})
-        oRow[pKey] = nullptr;
-    return oRow;
-}
-
-Json StatisticsToJson(const SourceFile& oFile, unsigned int nChannel, const krv::gobs::DataType& oType,
-                      const ChannelStatistics& oStatistics)
-{
-    return {{"number", nChannel},
-            {"type", oType.Describe()},
-            {"of", oType.IsComplex() ? "magnitude" : "value"},
-            {"noDataValue", TextOrNull(oFile.GetNoDataText(nChannel))},
-            {"min", oStatistics.minimum},
-            {"max", oStatistics.maximum},
-            {"mean", oStatistics.mean},
-            {"stdDev", oStatistics.deviation},
-            {"valid", oStatistics.valid},
-            {"noData", oStatistics.noData},
-            {"masked", oStatistics.masked},
-            {"nan", oStatistics.nan},
-            {"infinite", oStatistics.infinite}};
+    const auto Unless = [&oStatistics](const Json& oValue)
+    {
+        return oStatistics.alpha ? Json() : oValue;
+    };
+    return {{"number", oStatistics.number},
+            {"type", oStatistics.type.Describe()},
+            {"of", oStatistics.alpha              ? "alpha"
+                   : oStatistics.type.IsComplex() ? "magnitude"
+                                                  : "value"},
+            {"noDataValue", TextOrNull(oStatistics.noDataText)},
+            {"min", ToJson(oStatistics.minimum)},
+            {"max", ToJson(oStatistics.maximum)},
+            {"mean", ToJson(oStatistics.mean)},
+            {"stdDev", ToJson(oStatistics.deviation)},
+            {"valid", Unless(oStatistics.valid)},
+            {"noData", Unless(oStatistics.noData)},
+            {"masked", Unless(oStatistics.masked)},
+            {"nan", Unless(oStatistics.nan)},
+            {"infinite", Unless(oStatistics.infinite)}};
 }
 
 std::string Number(const Json& oNumber)
@@ -108,36 +86,11 @@ std::string Table(const Json& oRows)
 
 int RunStats(const std::string& file, const Options& oOptions)
 {
-    const auto oWanted = ParseNumbers(oOptions.channels, "--channels");
-    const SourceFile oFile(file);
-    const auto oChannels = oFile.CheckChannels(oWanted);
-    const unsigned int nAlpha = oOptions.raw ? 0 : krv::datasources::FindAlpha(oFile.GetMetadata());
+    const operations::StatisticsRequest oRequest{ParseNumbers(oOptions.channels, "--channels"), oOptions.raw};
+    const operations::SourceFile oFile(file);
     Json oRows = Json::array();
-    oRows.get_ref<Json::array_t&>().resize(oChannels.size());
-    for (ChannelGroup oGroup : oFile.GroupByType(oChannels))
-    {
-        for (std::size_t i = oGroup.channels.size(); i-- > 0;)
-        {
-            if (oGroup.channels[i] != nAlpha)
-                continue;
-            oRows[oGroup.positions[i]] = AlphaToJson(nAlpha, oFile.GetType(nAlpha));
-            oGroup.channels.erase(oGroup.channels.begin() + static_cast<std::ptrdiff_t>(i));
-            oGroup.positions.erase(oGroup.positions.begin() + static_cast<std::ptrdiff_t>(i));
-        }
-        if (oGroup.channels.empty())
-            continue;
-        const LevelReader oReader = oFile.Read(oGroup.channels);
-        const krv::gobs::DataType oType = oReader.Get().GetDataType();
-        std::vector<OptionalNoData> oNoData;
-        for (const unsigned int nChannel : oGroup.channels)
-            oNoData.push_back(oFile.GetNoData(nChannel));
-        Progress oProgress("stats", krv::gobs::BufferBytes(oReader.Get().GetWidth(), oReader.Get().GetHeight(),
-                                                           oGroup.channels.size(), oType));
-        const auto poValidity = oOptions.raw ? nullptr : FindValidity(oFile, oGroup.channels);
-        const auto oFound = ComputeStatistics(oReader.Get(), oNoData, poValidity.get(), oProgress);
-        for (std::size_t i = 0; i < oFound.size(); ++i)
-            oRows[oGroup.positions[i]] = StatisticsToJson(oFile, oGroup.channels[i], oType, oFound[i]);
-    }
+    for (const auto& oStatistics : operations::ComputeStatistics(oFile, oRequest, ShowProgress()))
+        oRows.push_back(StatisticsToJson(oStatistics));
     Print(oOptions.json ? ToText({{"file", file},
                                   {"width", oFile.GetRaster().GetWidth()},
                                   {"height", oFile.GetRaster().GetHeight()},

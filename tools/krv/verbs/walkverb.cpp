@@ -1,11 +1,11 @@
 #include "datasources/reader/irasterreader.h"
 #include "datasources/reader/rasterrange.h"
 #include "gobs/raster/raster.h"
+#include "operations/source/sourcefile.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/progress.h"
-#include "tools/krv/sourcefile.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -18,6 +18,8 @@
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 namespace
 {
@@ -62,7 +64,7 @@ void SetMargins(krv::datasources::IRasterReader& oReader, unsigned int nX, unsig
     }
 }
 
-void Walk(krv::datasources::IRasterReader& oReader, Progress& oProgress, Walked& oWalked)
+void Walk(krv::datasources::IRasterReader& oReader, ProgressCounter& oProgress, Walked& oWalked)
 {
     for (const std::unique_ptr<krv::gobs::Raster> poTile : krv::datasources::RasterRange(oReader))
     {
@@ -103,7 +105,7 @@ int RunWalk(const std::string& file, const Options& oOptions)
         nTileWidth = oReader.Get().GetTileWidth();
         nTileHeight = oReader.Get().GetTileHeight();
         SetMargins(oReader.Get(), nXMargin, nYMargin, oOptions.behaviour);
-        Progress oProgress("walk", ExpectedBytes(oReader.Get()));
+        ProgressCounter oProgress(ShowProgress(), "walk", ExpectedBytes(oReader.Get()));
         Walk(oReader.Get(), oProgress, oWalked);
     }
     const double nSeconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - oStart).count();

@@ -1,9 +1,9 @@
-#include "tools/krv/checksums.h"
+#include "operations/checksum/checksums.h"
 
 #include "datasources/reader/irasterreader.h"
 #include "datasources/reader/rasterrange.h"
 #include "gobs/raster/raster.h"
-#include "tools/krv/progress.h"
+#include "operations/source/sourcefile.h"
 
 #include <libdeflate.h>
 
@@ -14,7 +14,7 @@
 
 static_assert(std::endian::native == std::endian::little, "checksums are over little-endian values");
 
-namespace krv::tool
+namespace krv::operations
 {
 
 namespace
@@ -148,7 +148,7 @@ void BoundTiles(krv::datasources::IRasterReader& oReader)
 
 } // namespace
 
-std::vector<std::uint32_t> ComputeChecksums(krv::datasources::IRasterReader& oReader, Progress& oProgress)
+std::vector<std::uint32_t> ComputeChecksums(krv::datasources::IRasterReader& oReader, const Progress& oProgress)
 {
     BoundTiles(oReader);
     const unsigned int nWidth = oReader.GetWidth(), nChannels = oReader.GetChansCount();
@@ -159,6 +159,8 @@ std::vector<std::uint32_t> ComputeChecksums(krv::datasources::IRasterReader& oRe
     Band oBand(bDirect ? 0 : nBandWidth, oReader.GetTileHeight(), nChannels,
                static_cast<std::size_t>(oReader.GetDataType().GetValueBits() / 8));
     std::vector<std::uint32_t> oSums(nChannels, 0);
+    ProgressCounter oCounter(oProgress, "checksum",
+                             krv::gobs::BufferBytes(nWidth, oReader.GetHeight(), nChannels, oReader.GetDataType()));
     for (const std::unique_ptr<krv::gobs::Raster> poTile : krv::datasources::RasterRange(oReader))
     {
         const unsigned int nX = static_cast<unsigned int>(poTile->GetX());
@@ -169,9 +171,27 @@ std::vector<std::uint32_t> ComputeChecksums(krv::datasources::IRasterReader& oRe
         const std::uint64_t nTileWidth = poTile->GetWidth();
         if (!bDirect && (bInOrder || nX + nTileWidth == nWidth))
             oBand.Update(oSums, poTile->GetHeight() * (bInOrder ? nTileWidth : nWidth));
-        oProgress.Advance(poTile->GetBufferSize());
+        oCounter.Advance(poTile->GetBufferSize());
     }
     return oSums;
 }
 
-} // namespace krv::tool
+Checksums ComputeChecksums(const SourceFile& oFile, const std::vector<unsigned int>& oChannels, unsigned int nLevel,
+                           const Progress& oProgress)
+{
+    const auto oWanted = oFile.CheckChannels(oChannels);
+    Checksums oResult;
+    oResult.channels.resize(oWanted.size());
+    for (const ChannelGroup& oGroup : oFile.GroupByType(oWanted))
+    {
+        const LevelReader oReader = oFile.Read(oGroup.channels, nLevel);
+        oResult.width = oReader.Get().GetWidth();
+        oResult.height = oReader.Get().GetHeight();
+        const auto oSums = ComputeChecksums(oReader.Get(), oProgress);
+        for (std::size_t i = 0; i < oSums.size(); ++i)
+            oResult.channels[oGroup.positions[i]] = {oGroup.channels[i], oReader.Get().GetDataType(), oSums[i]};
+    }
+    return oResult;
+}
+
+} // namespace krv::operations

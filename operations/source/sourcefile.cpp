@@ -1,4 +1,4 @@
-#include "tools/krv/sourcefile.h"
+#include "operations/source/sourcefile.h"
 
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
@@ -6,17 +6,22 @@
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/ioverviewaccessor.h"
+#include "operations/job/exceptions.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
-#include "tools/krv/errors.h"
 
 #include <fmt/format.h>
 
+#include <sys/stat.h>
+#include <unistd.h>
+
 #include <algorithm>
+#include <cerrno>
+#include <cstring>
 #include <filesystem>
 #include <system_error>
 
-namespace krv::tool
+namespace krv::operations
 {
 
 using krv::datasources::IOverviewReaderAccessor;
@@ -47,6 +52,24 @@ bool Has(const IOverviewReaderAccessor& oAccessor, unsigned int nLevel)
 }
 
 } // namespace
+
+std::string WhyUnreadable(const std::string& file)
+{
+    struct stat oStatus = {};
+    if (stat(file.c_str(), &oStatus) != 0)
+    {
+        if (errno == ENOENT)
+            return "there is no such file; check the name and the folder";
+        return std::string("it cannot be reached: ") + std::strerror(errno);
+    }
+    if (S_ISDIR(oStatus.st_mode))
+        return "it is a folder; name a file in it";
+    if (!S_ISREG(oStatus.st_mode))
+        return "it is not a regular file; copy its content into one";
+    if (access(file.c_str(), R_OK) != 0)
+        return "it may not be read; ask its owner for the right to read it";
+    return {};
+}
 
 bool IsReferenceTo(const std::string& reference, const std::string& file)
 {
@@ -107,7 +130,7 @@ OptionalNoData SourceFile::GetNoData(unsigned int nChannel) const
     if (!text.empty() && !oValue)
         krv::nspio::Warning::Warn(
             fmt::format("{}: the no-data value \"{}\" is no number and is not used", moName, text),
-            "tools/krv/sourcefile", 0);
+            "operations/source/sourcefile", 0);
     return oValue;
 }
 
@@ -122,7 +145,7 @@ std::vector<unsigned int> SourceFile::CheckChannels(const std::vector<unsigned i
     for (const unsigned int nChannel : oResult)
     {
         if (nChannel == 0 || nChannel > nCount)
-            throw UsageError(
+            throw RequestException(
                 fmt::format("{}: there is no channel {}; its channels are 1 to {}", moName, nChannel, nCount));
     }
     return oResult;
@@ -166,8 +189,8 @@ LevelReader SourceFile::Read(const std::vector<unsigned int>& oChannels, unsigne
         return {std::move(poFull), nullptr, nullptr};
     std::unique_ptr<IOverviewReaderAccessor> poAccessor(poFull->GetOverviewReaderAccessor());
     if (poAccessor == nullptr || !Has(*poAccessor, nLevel))
-        throw UsageError(fmt::format("{}: there is no level {}; {}", moName, nLevel,
-                                     poAccessor == nullptr ? "there are none" : LevelList(*poAccessor)));
+        throw RequestException(fmt::format("{}: there is no level {}; {}", moName, nLevel,
+                                           poAccessor == nullptr ? "there are none" : LevelList(*poAccessor)));
     std::unique_ptr<IRasterReader> poLevel(poAccessor->CreateRasterReader(nLevel));
     return {std::move(poFull), std::move(poAccessor), std::move(poLevel)};
 }
@@ -192,10 +215,10 @@ LevelReader SourceFile::ReadAtLeast(const std::vector<unsigned int>& oChannels, 
         catch (const krv::Exception&)
         {
             krv::nspio::Warning::Warn(fmt::format("{}: level {} cannot be read: {}", moName, nLevel, CurrentMessage()),
-                                      "tools/krv/sourcefile", 0);
+                                      "operations/source/sourcefile", 0);
         }
     }
     return {std::move(poFull), nullptr, nullptr};
 }
 
-} // namespace krv::tool
+} // namespace krv::operations

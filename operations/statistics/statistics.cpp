@@ -1,12 +1,12 @@
-#include "tools/krv/statistics.h"
+#include "operations/statistics/statistics.h"
 
 #include "datasources/reader/irasterreader.h"
 #include "datasources/reader/rasterrange.h"
+#include "datasources/reader/validitysource.h"
 #include "gobs/mask/imaskbuilder.h"
 #include "gobs/mask/mask.h"
 #include "gobs/mask/samplematch.h"
 #include "gobs/raster/raster.h"
-#include "tools/krv/progress.h"
 
 #include <algorithm>
 #include <array>
@@ -14,12 +14,13 @@
 #include <limits>
 #include <type_traits>
 
-namespace krv::tool
+namespace krv::operations
 {
 
 namespace
 {
 
+using krv::datasources::ValiditySource;
 __extension__ using Wide = __int128;
 
 constexpr std::size_t RUN = 4096;
@@ -198,14 +199,14 @@ public:
     }
 
 private:
-    static Json Exact(T nValue)
+    static ExactNumber Exact(T nValue)
     {
         if constexpr (std::is_floating_point_v<T>)
-            return Json(static_cast<double>(nValue));
+            return static_cast<double>(nValue);
         else if constexpr (std::is_signed_v<T>)
-            return Json(static_cast<std::int64_t>(nValue));
+            return static_cast<std::int64_t>(nValue);
         else
-            return Json(static_cast<std::uint64_t>(nValue));
+            return static_cast<std::uint64_t>(nValue);
     }
 
     std::uint64_t mnCount = 0;
@@ -365,7 +366,58 @@ private:
     std::array<double, RUN> moValid;
 };
 
+// One result per channel of the reader. oNoData: one per channel. pValidity: set bits are valid pixels; null: all are.
+std::vector<ChannelStatistics> StatisticsOf(krv::datasources::IRasterReader& oReader,
+                                            const std::vector<OptionalNoData>& oNoData,
+                                            const krv::gobs::IMaskBuilder* pValidity, const Progress& oProgress)
+{
+    const unsigned int nChannels = oReader.GetChansCount();
+    const auto nValueBytes = static_cast<std::size_t>(oReader.GetDataType().GetValueBits() / 8);
+    std::vector<std::unique_ptr<StatisticsGatherer>> oGatherers;
+    for (unsigned int c = 0; c < nChannels; ++c)
+        oGatherers.push_back(StatisticsGatherer::Make(oReader.GetDataType(), oNoData.at(c)));
+    ProgressCounter oCounter(
+        oProgress, "stats",
+        krv::gobs::BufferBytes(oReader.GetWidth(), oReader.GetHeight(), nChannels, oReader.GetDataType()));
+    oReader.SetMargins(0, 0, eMirror);
+    for (const std::unique_ptr<krv::gobs::Raster> poTile : krv::datasources::RasterRange(oReader))
+    {
+        const std::uint64_t nPixels = static_cast<std::uint64_t>(poTile->GetWidth()) * poTile->GetHeight();
+        const std::unique_ptr<const krv::gobs::Mask> poMask(pValidity != nullptr ? pValidity->BuildMask(*poTile)
+                                                                                 : nullptr);
+        const unsigned char* const pValid =
+            poMask != nullptr && poMask->CountSet() != nPixels ? poMask->GetBits() : nullptr;
+        for (unsigned int c = 0; c < nChannels; ++c)
+            oGatherers[c]->Add(poTile->GetBuffer() + c * nValueBytes, nPixels, nChannels, pValid);
+        oCounter.Advance(poTile->GetBufferSize());
+    }
+    std::vector<ChannelStatistics> oResults;
+    for (const auto& poGatherer : oGatherers)
+        oResults.push_back(poGatherer->Get());
+    return oResults;
+}
+
+// What says which pixels are valid beside the values of their own channels; null when nothing does.
+std::unique_ptr<ValiditySource> FindValidity(const SourceFile& oFile, const std::vector<unsigned int>& oChannels)
+{
+    const auto IsNone = [&oFile](unsigned int nChannel)
+    {
+        return !oFile.GetNoData(nChannel);
+    };
+    const auto IsUnread = [&](unsigned int nChannel)
+    {
+        return IsNone(nChannel) && !oFile.GetNoDataText(nChannel).empty();
+    };
+    const bool bUnread = std::any_of(oChannels.begin(), oChannels.end(), IsUnread);
+    auto poSource = std::make_unique<ValiditySource>(&oFile.GetDataset(), oChannels, krv::gobs::eAllChannels, !bUnread);
+    // A pixel without data in all channels that have a value is none in those that have not.
+    const bool bPixels = poSource->HasNoData() && std::any_of(oChannels.begin(), oChannels.end(), IsNone);
+    return poSource->HasBitmap() || poSource->HasAlpha() || bPixels ? std::move(poSource) : nullptr;
+}
+
 } // namespace
+
+StatisticsGatherer::~StatisticsGatherer() = default;
 
 std::unique_ptr<StatisticsGatherer> StatisticsGatherer::Make(const krv::gobs::DataType& oType,
                                                              const OptionalNoData& oNoData)
@@ -380,31 +432,41 @@ std::unique_ptr<StatisticsGatherer> StatisticsGatherer::Make(const krv::gobs::Da
                      });
 }
 
-std::vector<ChannelStatistics> ComputeStatistics(krv::datasources::IRasterReader& oReader,
-                                                 const std::vector<OptionalNoData>& oNoData,
-                                                 const krv::gobs::IMaskBuilder* pValidity, Progress& oProgress)
+std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile, const StatisticsRequest& oRequest,
+                                                 const Progress& oProgress)
 {
-    const unsigned int nChannels = oReader.GetChansCount();
-    const auto nValueBytes = static_cast<std::size_t>(oReader.GetDataType().GetValueBits() / 8);
-    std::vector<std::unique_ptr<StatisticsGatherer>> oGatherers;
-    for (unsigned int c = 0; c < nChannels; ++c)
-        oGatherers.push_back(StatisticsGatherer::Make(oReader.GetDataType(), oNoData.at(c)));
-    oReader.SetMargins(0, 0, eMirror);
-    for (const std::unique_ptr<krv::gobs::Raster> poTile : krv::datasources::RasterRange(oReader))
+    const auto oChannels = oFile.CheckChannels(oRequest.channels);
+    const unsigned int nAlpha = oRequest.raw ? 0 : krv::datasources::FindAlpha(oFile.GetMetadata());
+    std::vector<ChannelStatistics> oResults(oChannels.size());
+    for (ChannelGroup oGroup : oFile.GroupByType(oChannels))
     {
-        const std::uint64_t nPixels = static_cast<std::uint64_t>(poTile->GetWidth()) * poTile->GetHeight();
-        const std::unique_ptr<const krv::gobs::Mask> poMask(pValidity != nullptr ? pValidity->BuildMask(*poTile)
-                                                                                 : nullptr);
-        const unsigned char* const pValid =
-            poMask != nullptr && poMask->CountSet() != nPixels ? poMask->GetBits() : nullptr;
-        for (unsigned int c = 0; c < nChannels; ++c)
-            oGatherers[c]->Add(poTile->GetBuffer() + c * nValueBytes, nPixels, nChannels, pValid);
-        oProgress.Advance(poTile->GetBufferSize());
+        for (std::size_t i = oGroup.channels.size(); i-- > 0;)
+        {
+            if (oGroup.channels[i] != nAlpha)
+                continue;
+            oResults[oGroup.positions[i]].alpha = true;
+            oGroup.channels.erase(oGroup.channels.begin() + static_cast<std::ptrdiff_t>(i));
+            oGroup.positions.erase(oGroup.positions.begin() + static_cast<std::ptrdiff_t>(i));
+        }
+        if (oGroup.channels.empty())
+            continue;
+        const LevelReader oReader = oFile.Read(oGroup.channels);
+        std::vector<OptionalNoData> oNoData;
+        for (const unsigned int nChannel : oGroup.channels)
+            oNoData.push_back(oFile.GetNoData(nChannel));
+        const auto poValidity = oRequest.raw ? nullptr : FindValidity(oFile, oGroup.channels);
+        auto oFound = StatisticsOf(oReader.Get(), oNoData, poValidity.get(), oProgress);
+        for (std::size_t i = 0; i < oFound.size(); ++i)
+            oResults[oGroup.positions[i]] = std::move(oFound[i]);
     }
-    std::vector<ChannelStatistics> oResults;
-    for (const auto& poGatherer : oGatherers)
-        oResults.push_back(poGatherer->Get());
+    for (std::size_t i = 0; i < oChannels.size(); ++i)
+    {
+        oResults[i].number = oChannels[i];
+        oResults[i].type = oFile.GetType(oChannels[i]);
+        if (!oResults[i].alpha)
+            oResults[i].noDataText = oFile.GetNoDataText(oChannels[i]);
+    }
     return oResults;
 }
 
-} // namespace krv::tool
+} // namespace krv::operations

@@ -3,7 +3,8 @@
 #include "datasources/interfaces/accessmode.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/raster/datatype.h"
-#include "tools/krv/pixeltypes.h"
+#include "operations/api.h"
+#include "operations/source/pixeltypes.h"
 
 #include <memory>
 #include <string>
@@ -18,15 +19,19 @@ class IRasterDataset;
 class IRasterReader;
 } // namespace krv::datasources
 
-namespace krv::tool
+namespace krv::operations
 {
+
+// Why a file cannot be opened, from the operating system: "there is no such file", "it is a folder", ... ; empty when
+// nothing stands against it.
+KRV_OPERATIONS_API std::string WhyUnreadable(const std::string& file);
 
 // Whether a reference in metadata means a file: it names it as the user does, or as it lies beside the one that refers
 // to it.
-bool IsReferenceTo(const std::string& reference, const std::string& file);
+KRV_OPERATIONS_API bool IsReferenceTo(const std::string& reference, const std::string& file);
 
 // A reader and, for a level, what it stands on.
-class LevelReader
+class KRV_OPERATIONS_API LevelReader
 {
 public:
     LevelReader(std::unique_ptr<krv::datasources::IRasterReader> poFull,
@@ -52,7 +57,7 @@ struct ChannelGroup
 };
 
 // An open file. Readers live at most as long as it.
-class SourceFile
+class KRV_OPERATIONS_API SourceFile
 {
 public:
     // Passes what the manager throws.
@@ -74,12 +79,12 @@ public:
     // The number in that text; a text that is none counts as no value, and a warning says so.
     OptionalNoData GetNoData(unsigned int nChannel) const;
 
-    // All channels for an empty list. Throws UsageError for a channel that the file does not have.
+    // All channels for an empty list. Throws RequestException for a channel that the file does not have.
     std::vector<unsigned int> CheckChannels(const std::vector<unsigned int>& oChannels) const;
     // By type, in the order in which the types appear.
     std::vector<ChannelGroup> GroupByType(const std::vector<unsigned int>& oChannels) const;
 
-    // Channels of one type at full size (level 1) or at a level. Throws UsageError for a level that is not there.
+    // Channels of one type at full size (level 1) or at a level. Throws RequestException for a level that is not there.
     LevelReader Read(const std::vector<unsigned int>& oChannels, unsigned int nLevel = 1) const;
     // The coarsest level that is not smaller than the wanted size; full size when there is none.
     LevelReader ReadAtLeast(const std::vector<unsigned int>& oChannels, unsigned int nWidth,
@@ -95,4 +100,4 @@ private:
     krv::datasources::AuxiliaryData moMetadata;
 };
 
-} // namespace krv::tool
+} // namespace krv::operations

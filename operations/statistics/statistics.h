@@ -1,52 +1,49 @@
 #pragma once
 
 #include "gobs/raster/datatype.h"
-#include "tools/krv/jsontext.h"
-#include "tools/krv/pixeltypes.h"
+#include "operations/api.h"
+#include "operations/job/progress.h"
+#include "operations/source/sourcefile.h"
 
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <string>
+#include <variant>
 #include <vector>
 
-namespace krv::datasources
-{
-class IRasterReader;
-}
-
-namespace krv::gobs
-{
-class IMaskBuilder;
-}
-
-namespace krv::tool
+namespace krv::operations
 {
 
-class Progress;
+using ExactNumber = std::variant<std::int64_t, std::uint64_t, double>;
 
 // What a channel's values are like. A value counts once: as no-data, as masked (its pixel is not valid by something
 // else: the validity mask, alpha, the no-data of all other channels), as not a number, as infinite, or as valid; only
-// valid ones take part in the rest. Without a valid value the rest is null. Extremes are numbers of the channel's own
+// valid ones take part in the rest. Without a valid value there is no rest. Extremes are numbers of the channel's own
 // type, 64-bit integers exact; the standard deviation is that of the population. Complex channels: of the magnitude.
 struct ChannelStatistics
 {
+    unsigned int number = 0; // of the channel, from 1; 0 when they are of no file
+    krv::gobs::DataType type;
+    std::string noDataText; // as the file has it; empty when it has none
+    bool alpha = false;     // it says which pixels are valid and has no statistics of its own
     std::uint64_t valid = 0;
     std::uint64_t noData = 0;
     std::uint64_t masked = 0;
     std::uint64_t nan = 0;
     std::uint64_t infinite = 0;
-    Json minimum;
-    Json maximum;
-    Json mean;
-    Json deviation;
+    std::optional<ExactNumber> minimum;
+    std::optional<ExactNumber> maximum;
+    std::optional<double> mean;
+    std::optional<double> deviation;
 };
 
 // Gathers the statistics of one channel. Exact sums for integers; for reals each run of some thousand values is summed
 // around its own mean and the runs are merged in extended precision, so that a large offset costs no digits.
-class StatisticsGatherer
+class KRV_OPERATIONS_API StatisticsGatherer
 {
 public:
-    virtual ~StatisticsGatherer() = default;
+    virtual ~StatisticsGatherer();
 
     // Values of one channel, the first at pFirst, nStride values apart. pValid: a bit per pixel, the highest of a byte
     // first, or null when all are valid.
@@ -58,9 +55,15 @@ public:
     static std::unique_ptr<StatisticsGatherer> Make(const krv::gobs::DataType& oType, const OptionalNoData& oNoData);
 };
 
-// One result per channel of the reader. oNoData: one per channel. pValidity: set bits are valid pixels; null: all are.
-std::vector<ChannelStatistics> ComputeStatistics(krv::datasources::IRasterReader& oReader,
-                                                 const std::vector<OptionalNoData>& oNoData,
-                                                 const krv::gobs::IMaskBuilder* pValidity, Progress& oProgress);
+struct StatisticsRequest
+{
+    std::vector<unsigned int> channels; // empty: all
+    bool raw = false;                   // pixels that the validity mask or alpha leaves out count too
+};
 
-} // namespace krv::tool
+// One result for each channel that is asked for, in that order. Throws RequestException for a channel that is not
+// there.
+KRV_OPERATIONS_API std::vector<ChannelStatistics>
+ComputeStatistics(const SourceFile& oFile, const StatisticsRequest& oRequest, const Progress& oProgress = {});
+
+} // namespace krv::operations

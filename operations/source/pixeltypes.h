@@ -7,7 +7,7 @@
 #include <optional>
 #include <utility>
 
-namespace krv::tool
+namespace krv::operations
 {
 
 // A channel's no-data value, when it has one.
@@ -48,4 +48,4 @@ decltype(auto) VisitPart(const krv::gobs::DataType& oType, Function&& oFunction)
     }
 }
 
-} // namespace krv::tool
+} // namespace krv::operations

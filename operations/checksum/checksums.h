@@ -1,0 +1,47 @@
+#pragma once
+
+#include "gobs/raster/datatype.h"
+#include "operations/api.h"
+#include "operations/job/progress.h"
+
+#include <cstdint>
+#include <vector>
+
+namespace krv::datasources
+{
+class IRasterReader;
+}
+
+namespace krv::operations
+{
+
+class SourceFile;
+
+struct ChannelChecksum
+{
+    unsigned int number = 0; // of the channel, from 1
+    krv::gobs::DataType type;
+    std::uint32_t crc32 = 0;
+};
+
+struct Checksums
+{
+    unsigned int width = 0;
+    unsigned int height = 0;
+    std::vector<ChannelChecksum> channels; // in the order in which they were asked for
+};
+
+// CRC-32 (the polynomial of zlib) of each channel over its pixels in row-major order, little-endian, without margins,
+// of the image or of one of its levels. No channels: all. Throws RequestException for a channel or a level that is not
+// there. Reads each tile once.
+KRV_OPERATIONS_API Checksums ComputeChecksums(const SourceFile& oFile, const std::vector<unsigned int>& oChannels,
+                                              unsigned int nLevel = 1, const Progress& oProgress = {});
+
+// The same of each channel of a reader, whose tile size changes. Memory: the pixels of a row of tiles, at most
+// MAX_BAND_BYTES whatever the size of the image.
+KRV_OPERATIONS_API std::vector<std::uint32_t> ComputeChecksums(krv::datasources::IRasterReader& oReader,
+                                                               const Progress& oProgress = {});
+
+constexpr std::uint64_t MAX_BAND_BYTES = 128ULL << 20U;
+
+} // namespace krv::operations

@@ -1,0 +1,35 @@
+#include "operations/job/exceptions.h"
+
+#include "toolkit/xml/xmlerror.h"
+
+namespace krv::operations
+{
+
+RequestException::RequestException(const std::string& message, const krv::Place& oPlace)
+    : krv::Exception(message, oPlace)
+{
+}
+
+RequestException::~RequestException() = default;
+
+StoppedException::StoppedException(const krv::Place& oPlace) : krv::Exception("stopped", oPlace) {}
+
+StoppedException::~StoppedException() = default;
+
+std::string CurrentMessage()
+{
+    try
+    {
+        throw;
+    }
+    catch (const std::exception& oError)
+    {
+        return oError.what();
+    }
+    catch (...)
+    {
+        return krv::xml::DescribeCurrentException();
+    }
+}
+
+} // namespace krv::operations

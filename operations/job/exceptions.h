@@ -1,0 +1,30 @@
+#pragma once
+
+#include "operations/api.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <string>
+
+namespace krv::operations
+{
+
+// What was asked for makes no sense by itself or for this file, such as a channel that it does not have.
+class KRV_OPERATIONS_API RequestException : public krv::Exception
+{
+public:
+    explicit RequestException(const std::string& message, const krv::Place& oPlace = krv::Place::Current());
+    ~RequestException() override;
+};
+
+// The caller's progress function said to stop; the message is "stopped".
+class KRV_OPERATIONS_API StoppedException : public krv::Exception
+{
+public:
+    explicit StoppedException(const krv::Place& oPlace = krv::Place::Current());
+    ~StoppedException() override;
+};
+
+// What the exception that is being handled says by itself, whatever its kind. To be called in a catch block only.
+KRV_OPERATIONS_API std::string CurrentMessage();
+
+} // namespace krv::operations

@@ -1,0 +1,39 @@
+#pragma once
+
+#include "operations/api.h"
+
+#include <cstdint>
+#include <functional>
+
+namespace krv::operations
+{
+
+// How far a job is. A job has one part or several, one after the other, each of which counts from 0 to its own total.
+struct Amount
+{
+    const char* part = ""; // a word for programs, such as "mask"
+    std::uint64_t done = 0;
+    std::uint64_t total = 0; // bytes of pixels, as near as is known before
+};
+
+// Called when a part begins and between pieces of work, by the thread that does the job. False stops the job, which
+// throws StoppedException then and leaves files as if it had failed. May throw. An empty function: nobody asks.
+using Progress = std::function<bool(const Amount&)>;
+
+// For those who write jobs: says how far it is. Throws StoppedException when the function says to stop.
+KRV_OPERATIONS_API void Report(const Progress& oProgress, const Amount& oAmount);
+
+// The same, counting one part.
+class KRV_OPERATIONS_API ProgressCounter
+{
+public:
+    ProgressCounter(Progress oProgress, const char* pPart, std::uint64_t nTotal);
+
+    void Advance(std::uint64_t nMore);
+
+private:
+    Progress moProgress;
+    Amount moAmount;
+};
+
+} // namespace krv::operations
