@@ -3,8 +3,8 @@
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/ichannelfilter.h"
 #include "datasources/interfaces/idataset.h"
-#include "datasources/interfaces/ioverviewio.h"
 #include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/irasterio.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/reader/basicoverviewreaderaccessor.h"
 #include "datasources/reader/checkrastercompatible.h"
@@ -33,10 +33,26 @@ IRasterDataset& RequireRaster(IDataset* poDataset, const std::string& message, c
     return *poRasterDataset;
 }
 
-void RequireChannels(const std::vector<unsigned int>& oChannels, const std::string& message, const Place& oPlace)
+IRasterDataset& RequireRasterFile(const std::unique_ptr<IDataset>& oDataset, const std::string& fileName,
+                                  const Place& oPlace)
+{
+    return RequireRaster(oDataset.get(), "Format does not support rasters: file=" + fileName, oPlace);
+}
+
+const std::vector<unsigned int>& RequireChannels(const std::vector<unsigned int>& oChannels, const std::string& message,
+                                                 const Place& oPlace)
 {
     if (oChannels.empty())
         throw krv::DataException(message, oPlace);
+    return oChannels;
+}
+
+// The listed channels, or all.
+std::vector<unsigned int> Available(const IRasterDataset& oRasterDataset, const std::vector<unsigned int>& oChannels,
+                                    const Place& oPlace)
+{
+    return RequireChannels(oChannels.empty() ? detail::AllChannels(oRasterDataset) : oChannels,
+                           "No available channels.", oPlace);
 }
 
 } // namespace
@@ -49,11 +65,9 @@ BasicReader::BasicReader(const std::string& fileName)
     const Place oPlace = Place::Current();
     try
     {
-        IRasterDataset& oRasterDataset =
-            RequireRaster(oDataset.get(), "Format does not support rasters: file=" + fileName, oPlace);
-        mpoChannels->moChannels = detail::AllChannels(oRasterDataset);
-        RequireChannels(mpoChannels->moChannels, "No channels in dataset: file=" + fileName, oPlace);
-        UseChannels(oDataset.get(), oRasterDataset, nullptr, oPlace);
+        const auto oChannels = detail::AllChannels(RequireRasterFile(oDataset, fileName, oPlace));
+        RequireChannels(oChannels, "No channels in dataset: file=" + fileName, oPlace);
+        UseFile(std::move(oDataset), oChannels, oPlace);
     }
     catch (const krv::Exception& oException)
     {
@@ -63,44 +77,36 @@ BasicReader::BasicReader(const std::string& fileName)
     {
         throw krv::DataException(oException.what(), oPlace);
     }
-    TakeDataset(std::move(oDataset));
 }
 
 BasicReader::BasicReader(const std::string& fileName, const std::vector<unsigned int>& oChannels)
 {
     std::unique_ptr<IDataset> oDataset = OpenForReading(fileName);
     const Place oPlace = Place::Current();
-    IRasterDataset& oRasterDataset =
-        RequireRaster(oDataset.get(), "Format does not support rasters: file=" + fileName, oPlace);
-    mpoChannels->moChannels = oChannels.empty() ? detail::AllChannels(oRasterDataset) : oChannels;
-    RequireChannels(mpoChannels->moChannels, "No available channels.", oPlace);
-    UseChannels(oDataset.get(), oRasterDataset, nullptr, oPlace);
-    TakeDataset(std::move(oDataset));
+    const auto oAvailable = Available(RequireRasterFile(oDataset, fileName, oPlace), oChannels, oPlace);
+    UseFile(std::move(oDataset), oAvailable, oPlace);
 }
 
 BasicReader::BasicReader(const std::string& fileName, const IChannelFilter& oFilter)
 {
     std::unique_ptr<IDataset> oDataset = OpenForReading(fileName);
     const Place oPlace = Place::Current();
-    IRasterDataset& oRasterDataset =
-        RequireRaster(oDataset.get(), "Format does not support rasters: file=" + fileName, oPlace);
-    mpoChannels->moChannels = oFilter.Accept(oRasterDataset);
-    RequireChannels(mpoChannels->moChannels, "No channels in dataset: file=" + fileName, oPlace);
-    UseChannels(oDataset.get(), oRasterDataset, nullptr, oPlace);
-    TakeDataset(std::move(oDataset));
+    const auto oChannels = oFilter.Accept(RequireRasterFile(oDataset, fileName, oPlace));
+    RequireChannels(oChannels, "No channels in dataset: file=" + fileName, oPlace);
+    UseFile(std::move(oDataset), oChannels, oPlace);
 }
 
 BasicReader::BasicReader(IBitmapDataset* poDataset, const std::vector<unsigned int>& oBitmaps, bool bTakeOwnership)
 {
     const Place oPlace = Place::Current();
-    mpoChannels->mpoDataset = dynamic_cast<IDataset*>(poDataset);
-    if (mpoChannels->mpoDataset == nullptr)
+    auto* const poRoot = dynamic_cast<IDataset*>(poDataset);
+    if (poRoot == nullptr)
         throw krv::DataException("The dataset is NULL", oPlace);
-    mpoChannels->mbBitmaps = true;
-    mpoChannels->moChannels = oBitmaps.empty() ? poDataset->GetBitmapList() : oBitmaps;
-    RequireChannels(mpoChannels->moChannels, "Bitmap list is empty", oPlace);
-    mpoChannels->Commit(detail::OpenBitmaps(*poDataset, mpoChannels->moChannels, oPlace));
-    mpoChannels->mbOwnsDataset = bTakeOwnership;
+    const auto oChannels = oBitmaps.empty() ? poDataset->GetBitmapList() : oBitmaps;
+    RequireChannels(oChannels, "Bitmap list is empty", oPlace);
+    mpoChannels->SetBitmaps();
+    mpoChannels->Commit(detail::OpenBitmaps(*poDataset, oChannels, oPlace));
+    SetDataset(poRoot, oChannels, bTakeOwnership);
 }
 
 BasicReader::BasicReader(IDataset* poDataset, const std::vector<unsigned int>& oChannels, bool bTakeOwnership)
@@ -108,11 +114,9 @@ BasicReader::BasicReader(IDataset* poDataset, const std::vector<unsigned int>& o
     const Place oPlace = Place::Current();
     if (poDataset == nullptr)
         throw krv::DataException("The dataset is NULL", oPlace);
-    IRasterDataset& oRasterDataset = RequireRaster(poDataset, "This dataset doesn't support Raster.", oPlace);
-    mpoChannels->moChannels = oChannels.empty() ? detail::AllChannels(oRasterDataset) : oChannels;
-    RequireChannels(mpoChannels->moChannels, "No available channels.", oPlace);
-    UseChannels(poDataset, oRasterDataset, nullptr, oPlace);
-    mpoChannels->mbOwnsDataset = bTakeOwnership;
+    const auto& oRasterDataset = RequireRaster(poDataset, "This dataset doesn't support Raster.", oPlace);
+    UseChannels(poDataset, Available(oRasterDataset, oChannels, oPlace), nullptr, oPlace);
+    mpoChannels->SetOwned(bTakeOwnership);
 }
 
 BasicReader::BasicReader(IRasterDataset* poRasterDataset, IRasterIO* poRasterIO,
@@ -127,36 +131,38 @@ BasicReader::BasicReader(IRasterDataset* poRasterDataset, IRasterIO* poRasterIO,
     auto* const poDataset = dynamic_cast<IDataset*>(poRasterDataset);
     if (poDataset == nullptr)
         throw krv::DataException("Invalid Raster Dataset", oPlace);
-    mpoChannels->moChannels = oChannels.empty() ? detail::AllChannels(*poRasterDataset) : oChannels;
-    RequireChannels(mpoChannels->moChannels, "No available channels.", oPlace);
-    UseChannels(poDataset, *poRasterDataset, std::move(oRasterIO), oPlace);
+    UseChannels(poDataset, Available(*poRasterDataset, oChannels, oPlace), std::move(oRasterIO), oPlace);
 }
 
 BasicReader::~BasicReader() = default;
 
-void BasicReader::UseChannels(IDataset* poDataset, IRasterDataset& oRasterDataset, std::unique_ptr<IRasterIO> oRasterIO,
-                              const Place& oPlace)
+void BasicReader::UseChannels(IDataset* poDataset, const std::vector<unsigned int>& oChannels,
+                              std::unique_ptr<IRasterIO> oRasterIO, const Place& oPlace)
 {
-    mpoChannels->Commit(detail::OpenChannels(oRasterDataset, mpoChannels->moChannels, std::move(oRasterIO), oPlace));
-    mpoChannels->mpoDataset = poDataset;
+    auto& oRasterDataset = dynamic_cast<IRasterDataset&>(*poDataset);
+    mpoChannels->Commit(detail::OpenChannels(oRasterDataset, oChannels, std::move(oRasterIO), oPlace));
+    SetDataset(poDataset, oChannels, false);
 }
 
-void BasicReader::TakeDataset(std::unique_ptr<IDataset> oDataset)
+void BasicReader::UseFile(std::unique_ptr<IDataset> oDataset, const std::vector<unsigned int>& oChannels,
+                          const Place& oPlace)
 {
-    mpoChannels->mpoDataset = oDataset.release();
-    mpoChannels->mbOwnsDataset = true;
+    UseChannels(oDataset.get(), oChannels, nullptr, oPlace);
+    mpoChannels->SetOwned(true);
+    static_cast<void>(oDataset.release());
 }
 
 krv::gobs::Raster* BasicReader::GetRaster(unsigned int nIndex)
 {
-    std::unique_ptr<krv::gobs::Raster> oRaster = mpoChannels->MakeTile(nIndex, Place::Current());
+    std::unique_ptr<krv::gobs::Raster> oRaster =
+        detail::MakeRaster(*this, mpoChannels->GetOpened().moGrid.GetTiles().GetTile(nIndex), Place::Current());
     ReadRaster(oRaster.get()); // virtual: a derived reader fills its own way
     return oRaster.release();
 }
 
 krv::gobs::Raster* BasicReader::ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight)
 {
-    std::unique_ptr<krv::gobs::Raster> oRaster = mpoChannels->MakeRaster(nX, nY, nWidth, nHeight, Place::Current());
+    std::unique_ptr<krv::gobs::Raster> oRaster = detail::MakeRaster(*this, {nX, nY, nWidth, nHeight}, Place::Current());
     ReadRaster(oRaster.get());
     return oRaster.release();
 }
@@ -180,11 +186,9 @@ void BasicReader::SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarg
 
 IOverviewReaderAccessor* BasicReader::GetOverviewReaderAccessor()
 {
-    const bool bOnLevel = dynamic_cast<IOverviewIO*>(mpoChannels->moOpened.mpoRasterIO.get()) != nullptr;
-    if (bOnLevel || mpoChannels->mbBitmaps)
+    if (!mpoChannels->HasLevels())
         return nullptr;
-    auto* const poRasterDataset = dynamic_cast<IRasterDataset*>(mpoChannels->mpoDataset);
-    return new BasicOverviewReaderAccessor(poRasterDataset, mpoChannels->moChannels);
+    return new BasicOverviewReaderAccessor(dynamic_cast<IRasterDataset*>(GetDataset()), GetChannels());
 }
 
 } // namespace krv::datasources

@@ -50,16 +50,18 @@ public:
     IOverviewReaderAccessor* GetOverviewReaderAccessor() override;
 
 protected:
-    // For derived readers, which set up their own state.
+    // For derived readers, which set up their own state by SetDataset and SetRasterIO.
     BasicReader();
 
     // Makes the margins of the sides that ReadRaster did not read. Throws DataException under eException.
     void FillMargins(krv::gobs::Raster* poRaster);
 
 private:
-    void UseChannels(IDataset* poDataset, IRasterDataset& oRasterDataset, std::unique_ptr<IRasterIO> oRasterIO,
-                     const krv::Place& oPlace);
-    void TakeDataset(std::unique_ptr<IDataset> oDataset);
+    // The dataset is borrowed until everything is open.
+    void UseChannels(IDataset* poDataset, const std::vector<unsigned int>& oChannels,
+                     std::unique_ptr<IRasterIO> oRasterIO, const krv::Place& oPlace);
+    void UseFile(std::unique_ptr<IDataset> oDataset, const std::vector<unsigned int>& oChannels,
+                 const krv::Place& oPlace);
 };
 
 } // namespace krv::datasources

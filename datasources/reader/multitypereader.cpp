@@ -11,7 +11,8 @@
 #include "datasources/reader/rasteriterator.h"
 #include "gobs/raster/buffertype.h"
 #include "gobs/raster/raster.h"
-#include "toolkit/core/hmalloc.h"
+#include "toolkit/core/hblock.h"
+#include "toolkit/core/ownedorborrowed.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/raster/merger.h"
@@ -41,12 +42,6 @@ bool IsConsecutive(const std::vector<unsigned int>& oPositions)
                               [](unsigned int nFirst, unsigned int nSecond)
                               { return nSecond != nFirst + 1; }) == oPositions.end();
 }
-
-struct FreeScratch
-{
-    void operator()(unsigned char* pBlock) const { HFree(pBlock); }
-};
-using Scratch = std::unique_ptr<unsigned char, FreeScratch>;
 
 // Where the channels of the result come from: a group counts as a source. Of two groups that are placed on one channel
 // the later one remains.
@@ -104,23 +99,17 @@ struct MultiTypeReader::State
     State() = default;
     State(const State&) = delete;
     State& operator=(const State&) = delete;
-    ~State()
-    {
-        moGroups.clear();
-        if (mbOwnsDataset)
-            delete mpoDataset;
-    }
+    ~State() { moGroups.clear(); } // before the dataset
 
     IRasterReader& First() const { return *moGroups.front().mpoReader; }
 
-    std::vector<Group> moGroups;    // ascending by data type
-    IDataset* mpoDataset = nullptr; // deleted only when mbOwnsDataset
+    std::vector<Group> moGroups; // ascending by data type
+    OwnedOrBorrowed<IDataset> mpoDataset;
     std::vector<unsigned int> moChannels;
     detail::ChannelInfos moInfos;
     krv::gobs::DataType moType;
     krv::gobs::TileIterator moTiles{0, 0};
     eChannelPlacement mePlacement = eFromFirstPlace;
-    bool mbOwnsDataset = false;
     bool mbOverviewsDisabled = false;               // the readers were ready-made
     std::unique_ptr<krv::raster::Merger> mpoMerger; // made by the first reading
 };
@@ -149,7 +138,7 @@ MultiTypeReader::MultiTypeReader(IDataset* poDataset, const std::vector<unsigned
                                  eChannelPlacement ePlacement)
     : MultiTypeReader()
 {
-    UseDataset(poDataset, oChannels, ePlacement, Place::Current());
+    UseDataset({poDataset, {}}, oChannels, ePlacement, Place::Current());
     WarnOfLoss(mpoState->moType, Place::Current());
 }
 
@@ -157,7 +146,7 @@ MultiTypeReader::MultiTypeReader(IDataset* poDataset, const std::vector<unsigned
                                  const krv::gobs::DataType& oType, eChannelPlacement ePlacement)
     : MultiTypeReader()
 {
-    UseDataset(poDataset, oChannels, ePlacement, Place::Current());
+    UseDataset({poDataset, {}}, oChannels, ePlacement, Place::Current());
     RequestType(oType, Place::Current());
 }
 
@@ -187,20 +176,19 @@ void MultiTypeReader::OpenFile(const std::string& fileName, const std::vector<un
     std::unique_ptr<IDataset> oDataset(DatasetManager::GetInstance()->Open(fileName, eReadOnly));
     if (dynamic_cast<IRasterDataset*>(oDataset.get()) == nullptr)
         throw krv::DataException("Format does not support rasters: file=" + fileName, oPlace);
-    mpoState->mbOwnsDataset = true;
-    mpoState->mpoDataset = oDataset.release();
-    UseDataset(mpoState->mpoDataset, oChannels, ePlacement, oPlace);
+    UseDataset({oDataset.release(), {true}}, oChannels, ePlacement, oPlace);
 }
 
-void MultiTypeReader::UseDataset(IDataset* poDataset, const std::vector<unsigned int>& oChannels,
+void MultiTypeReader::UseDataset(OwnedOrBorrowed<IDataset> oDataset, const std::vector<unsigned int>& oChannels,
                                  eChannelPlacement ePlacement, const Place& oPlace)
 {
     if (oChannels.empty())
         throw krv::DataException("Channels list is empty", oPlace);
+    IDataset* const poDataset = oDataset.get();
     auto* const poRasterDataset = dynamic_cast<IRasterDataset*>(poDataset);
     if (poRasterDataset == nullptr)
         throw krv::DataException("This Dataset doesn't supports Raster.", oPlace);
-    mpoState->mpoDataset = poDataset;
+    mpoState->mpoDataset = std::move(oDataset);
     mpoState->moChannels = oChannels;
     mpoState->mePlacement = ePlacement;
 
@@ -259,7 +247,7 @@ void MultiTypeReader::UseReaders(IDataset* poDataset, const std::vector<IRasterR
     std::stable_sort(oGroups.begin(), oGroups.end(),
                      [](const Group& oFirst, const Group& oSecond)
                      { return oFirst.mpoReader->GetDataType() < oSecond.mpoReader->GetDataType(); });
-    mpoState->mpoDataset = poDataset;
+    mpoState->mpoDataset.reset(poDataset);
     mpoState->moChannels = oChannels;
     mpoState->moGroups = std::move(oGroups);
     mpoState->mbOverviewsDisabled = true;
@@ -343,7 +331,7 @@ void MultiTypeReader::ReadGroups(krv::gobs::Raster& oRaster)
                                                 oGroup.moPositions.size(), oGroup.mpoReader->GetDataType());
         nScratchBytes = (nScratchBytes + 63) / 64 * 64;
     }
-    const Scratch oScratch(static_cast<unsigned char*>(HMalloc(nScratchBytes)));
+    const HBlock oScratch(static_cast<unsigned char*>(HMalloc(nScratchBytes)));
 
     std::vector<const unsigned char*> oSources;
     for (std::size_t nGroup = 0; nGroup < mpoState->moGroups.size(); ++nGroup)
@@ -439,7 +427,7 @@ IOverviewReaderAccessor* MultiTypeReader::GetOverviewReaderAccessor()
 {
     if (mpoState->mbOverviewsDisabled)
         return nullptr;
-    return new MultiTypeOverviewReaderAccessor(dynamic_cast<IRasterDataset*>(mpoState->mpoDataset),
+    return new MultiTypeOverviewReaderAccessor(dynamic_cast<IRasterDataset*>(mpoState->mpoDataset.get()),
                                                mpoState->moChannels, mpoState->moType);
 }
 

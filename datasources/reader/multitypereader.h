@@ -2,6 +2,7 @@
 
 #include "datasources/reader/irasterreader.h"
 #include "gobs/raster/datatype.h"
+#include "toolkit/core/ownedorborrowed.h"
 #include "toolkit/exceptions/place.h"
 
 #include <memory>
@@ -100,8 +101,8 @@ private:
 
     void OpenFile(const std::string& fileName, const std::vector<unsigned int>& oChannels, eChannelPlacement ePlacement,
                   const krv::Place& oPlace);
-    void UseDataset(IDataset* poDataset, const std::vector<unsigned int>& oChannels, eChannelPlacement ePlacement,
-                    const krv::Place& oPlace);
+    void UseDataset(OwnedOrBorrowed<IDataset> oDataset, const std::vector<unsigned int>& oChannels,
+                    eChannelPlacement ePlacement, const krv::Place& oPlace);
     void UseReaders(IDataset* poDataset, const std::vector<IRasterReader*>& oReaders,
                     const std::vector<unsigned int>& oChannels, const krv::Place& oPlace);
     void Settle();

@@ -1,5 +1,6 @@
 #include "datasources/reader/rasteraccess.h"
 
+#include "datasources/interfaces/channelinfo.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/metadata/auxiliarydata.h"
@@ -13,9 +14,23 @@ RasterAccess::RasterAccess() : mpoChannels(std::make_unique<detail::RasterChanne
 
 RasterAccess::~RasterAccess() = default;
 
+void RasterAccess::SetDataset(IDataset* poDataset, const std::vector<unsigned int>& oChannels, bool bTakeOwnership)
+{
+    mpoChannels->SetChannels(oChannels);
+    mpoChannels->SetDataset({poDataset, {bTakeOwnership}});
+}
+
+void RasterAccess::SetRasterIO(std::unique_ptr<IRasterIO> oRasterIO, const krv::gobs::DataType& oType)
+{
+    detail::OpenedChannels oOpened = detail::OpenRasterIO(std::move(oRasterIO), oType, Place::Current());
+    for (std::size_t nChannel = 0; nChannel < GetChannels().size(); ++nChannel)
+        oOpened.moInfos.Add(std::make_unique<ChannelInfo>(oType));
+    mpoChannels->Commit(std::move(oOpened));
+}
+
 RasterIterator RasterAccess::FindRaster(unsigned int nX, unsigned int nY)
 {
-    return RasterIterator(this, mpoChannels->moOpened.moTiles.GetTileIndex(nX, nY));
+    return RasterIterator(this, mpoChannels->GetOpened().moGrid.GetTiles().GetTileIndex(nX, nY));
 }
 
 RasterIterator RasterAccess::Begin()
@@ -30,7 +45,7 @@ RasterIterator RasterAccess::End()
 
 unsigned int RasterAccess::GetTileCount() const
 {
-    return mpoChannels->GetTileCount();
+    return mpoChannels->GetOpened().moGrid.GetCount();
 }
 
 void RasterAccess::SetOptimalTileSize()
@@ -45,12 +60,12 @@ void RasterAccess::SetTileSize(unsigned int nWidth, unsigned int nHeight)
 
 IFileFormat* RasterAccess::GetFileFormat() const
 {
-    return mpoChannels->mpoDataset->GetFileFormat();
+    return mpoChannels->GetDataset()->GetFileFormat();
 }
 
 krv::ogc::cs::ICRS* RasterAccess::GetCRS() const
 {
-    return mpoChannels->mpoDataset->ReadCRS();
+    return mpoChannels->GetDataset()->ReadCRS();
 }
 
 krv::ogc::cs::GeocodingInfo* RasterAccess::GetGeocodingInfo() const
@@ -65,62 +80,62 @@ AuxiliaryData RasterAccess::GetAuxiliaryData() const
 
 unsigned int RasterAccess::GetTileWidth() const
 {
-    return mpoChannels->moOpened.mnTileWidth;
+    return mpoChannels->GetOpened().moGrid.GetTileWidth();
 }
 
 unsigned int RasterAccess::GetTileHeight() const
 {
-    return mpoChannels->moOpened.mnTileHeight;
+    return mpoChannels->GetOpened().moGrid.GetTileHeight();
 }
 
 const std::vector<IChannelInfo*>& RasterAccess::GetChannelsInfo() const
 {
-    return mpoChannels->moOpened.moInfos.Get();
+    return mpoChannels->GetOpened().moInfos.Get();
 }
 
 unsigned int RasterAccess::GetXMargin() const
 {
-    return mpoChannels->mnXMargin;
+    return mpoChannels->GetXMargin();
 }
 
 unsigned int RasterAccess::GetYMargin() const
 {
-    return mpoChannels->mnYMargin;
+    return mpoChannels->GetYMargin();
 }
 
 eMarginBehaviour RasterAccess::GetMarginBehaviour() const
 {
-    return mpoChannels->meMarginBehaviour;
+    return mpoChannels->GetMarginBehaviour();
 }
 
 unsigned int RasterAccess::GetWidth() const
 {
-    return mpoChannels->moOpened.mnWidth;
+    return mpoChannels->GetOpened().mnWidth;
 }
 
 unsigned int RasterAccess::GetHeight() const
 {
-    return mpoChannels->moOpened.mnHeight;
+    return mpoChannels->GetOpened().mnHeight;
 }
 
 unsigned int RasterAccess::GetChansCount() const
 {
-    return static_cast<unsigned int>(mpoChannels->moChannels.size());
+    return static_cast<unsigned int>(mpoChannels->GetChannels().size());
 }
 
 const krv::gobs::DataType& RasterAccess::GetDataType() const
 {
-    return mpoChannels->moOpened.moType;
+    return mpoChannels->GetOpened().moType;
 }
 
 IDataset* RasterAccess::GetDataset() const
 {
-    return mpoChannels->mpoDataset;
+    return mpoChannels->GetDataset();
 }
 
 const std::vector<unsigned int>& RasterAccess::GetChannels() const
 {
-    return mpoChannels->moChannels;
+    return mpoChannels->GetChannels();
 }
 
 } // namespace krv::datasources

@@ -13,6 +13,8 @@ namespace detail
 class RasterChannels;
 }
 
+class IRasterIO;
+
 // The answers that the standard readers and writers give alike: tile grid, margins, size, type and what the dataset
 // says of itself.
 class KRV_DATASOURCES_API RasterAccess : public IDatasetAccess, public virtual IRasterReader
@@ -50,6 +52,14 @@ public:
 protected:
     // No dataset, no channels, no margins, eMirror.
     RasterAccess();
+
+    // How a derived class outside the library sets up its state; its own constructor and destructor do no more.
+    // What the rasters are taken from, which GetDataset and GetChannels answer. Size, type and tiles stay what they
+    // are.
+    void SetDataset(IDataset* poDataset, const std::vector<unsigned int>& oChannels, bool bTakeOwnership);
+    // How the pixels of these channels get into the rasters, all in one type: the size of the image and its tiles are
+    // those of the I/O, and each channel is described by its type. Throws DataException for null; the former I/O stays.
+    void SetRasterIO(std::unique_ptr<IRasterIO> oRasterIO, const krv::gobs::DataType& oType);
 
     std::unique_ptr<detail::RasterChannels> mpoChannels;
 };

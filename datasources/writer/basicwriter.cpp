@@ -7,8 +7,8 @@
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/inewfiledataset.h"
-#include "datasources/interfaces/ioverviewio.h"
 #include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/irasterio.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/basicoverviewreaderaccessor.h"
@@ -57,7 +57,7 @@ BasicWriter::BasicWriter(const std::string& fileName)
 {
     const IRasterDataset& oRasterDataset =
         UseFile(fileName, "Cannot open file for writing when it does not exist", Place::Current());
-    mpoChannels->moChannels = detail::AllChannels(oRasterDataset);
+    mpoChannels->SetChannels(detail::AllChannels(oRasterDataset));
     OpenDatasetOrCleanup(false);
 }
 
@@ -89,7 +89,7 @@ BasicWriter::BasicWriter(const std::string& fileName, const IChannelFilter& oFil
     // "Can not" and the other constructor's "Cannot" both stand, intended: callers tell the two by it.
     const IRasterDataset& oRasterDataset =
         UseFile(fileName, "Can not open file for writing when it does not exist", Place::Current());
-    mpoChannels->moChannels = oFilter.Accept(oRasterDataset);
+    mpoChannels->SetChannels(oFilter.Accept(oRasterDataset));
     OpenDatasetOrCleanup(false);
 }
 
@@ -99,9 +99,8 @@ BasicWriter::BasicWriter(IBitmapDataset* poDataset, const std::vector<unsigned i
     Require(!oBitmaps.empty(), "You should request at least one channel.", oPlace);
     auto* const poRoot = dynamic_cast<IDataset*>(poDataset);
     Require(poRoot != nullptr, "Invalid bitmap Dataset", oPlace);
-    mpoChannels->mbBitmaps = true;
-    mpoChannels->mpoDataset = poRoot;
-    mpoChannels->moChannels = oBitmaps;
+    mpoChannels->SetBitmaps();
+    SetDataset(poRoot, oBitmaps, false);
     if (poRoot->Exists())
         OpenDatasetOrCleanup(true);
 }
@@ -123,9 +122,8 @@ BasicWriter::BasicWriter(IRasterDataset* poDataset, IRasterIO* poRasterIO, const
 
     const std::unique_ptr<IChannelInfo> oFirst(poDataset->GetChannelInfo(oChannels.front()));
     Require(oFirst != nullptr, "The dataset gave no description of the first channel", oPlace);
-    mpoChannels->moChannels = oChannels;
     mpoChannels->Commit(detail::OpenRasterIO(std::move(oRasterIO), oFirst->GetDataType(), oPlace));
-    mpoChannels->mpoDataset = poRoot;
+    SetDataset(poRoot, oChannels, false);
 }
 
 BasicWriter::~BasicWriter() = default;
@@ -133,24 +131,20 @@ BasicWriter::~BasicWriter() = default;
 IDataset& BasicWriter::UseNamed(IDataset* poDataset, const std::string& fileName,
                                 const std::vector<unsigned int>& oChannels, const Place& oPlace)
 {
-    mpoChannels->mbOwnsDataset = true;
-    mpoChannels->mpoDataset = poDataset;
+    SetDataset(poDataset, oChannels, true);
     if (poDataset == nullptr)
         throw krv::DataException("Unrecognized format: file=" + fileName, oPlace);
     RequireFacet<IRasterDataset>(poDataset, "Format does not support rasters: file=" + fileName, oPlace);
-    mpoChannels->moChannels = oChannels;
     return *poDataset;
 }
 
 // Opens a file whose image must be there already, and owns it from then on.
 IRasterDataset& BasicWriter::UseFile(const std::string& fileName, const char* pMissing, const Place& oPlace)
 {
-    mpoChannels->mpoDataset = DatasetManager::GetInstance()->Open(fileName, eUpdate);
-    mpoChannels->mbOwnsDataset = true;
-    if (mpoChannels->mpoDataset != nullptr && !mpoChannels->mpoDataset->Exists())
+    SetDataset(DatasetManager::GetInstance()->Open(fileName, eUpdate), {}, true);
+    if (GetDataset() != nullptr && !GetDataset()->Exists())
         throw krv::FileNotFoundException(fileName, pMissing, oPlace);
-    return RequireFacet<IRasterDataset>(mpoChannels->mpoDataset, "Format does not support rasters: file=" + fileName,
-                                        oPlace);
+    return RequireFacet<IRasterDataset>(GetDataset(), "Format does not support rasters: file=" + fileName, oPlace);
 }
 
 void BasicWriter::UseRasterDataset(IRasterDataset* poDataset, const std::vector<unsigned int>& oChannels, bool bOwn,
@@ -158,9 +152,7 @@ void BasicWriter::UseRasterDataset(IRasterDataset* poDataset, const std::vector<
 {
     auto* const poRoot = dynamic_cast<IDataset*>(poDataset);
     Require(poRoot != nullptr, "Invalid Raster Dataset", oPlace);
-    mpoChannels->mpoDataset = poRoot;
-    mpoChannels->mbOwnsDataset = bOwn;
-    mpoChannels->moChannels = oChannels;
+    SetDataset(poRoot, oChannels, bOwn);
     if (poRoot->Exists())
         OpenDatasetOrCleanup(false);
 }
@@ -178,16 +170,14 @@ IRasterDataset* BasicWriter::RDSIf(const std::string& fileName)
 void BasicWriter::Init()
 {
     mpoChannels->Commit(detail::OpenedChannels());
-    mpoChannels->meMarginBehaviour = eMirror;
-    mpoChannels->mnXMargin = 0;
-    mpoChannels->mnYMargin = 0;
+    mpoChannels->SetMargins(0, 0, eMirror, Place::Current());
 }
 
 void BasicWriter::OpenDataset(bool bBitmaps)
 {
     const Place oPlace = Place::Current();
-    IDataset* const poDataset = mpoChannels->mpoDataset;
-    std::vector<unsigned int> oChannels = mpoChannels->moChannels;
+    IDataset* const poDataset = GetDataset();
+    std::vector<unsigned int> oChannels = GetChannels();
     detail::OpenedChannels oOpened;
     if (bBitmaps)
     {
@@ -207,7 +197,7 @@ void BasicWriter::OpenDataset(bool bBitmaps)
         Require(!oChannels.empty(), "No channels selected to write", oPlace);
         oOpened = detail::OpenChannels(oRasterDataset, oChannels, nullptr, oPlace);
     }
-    mpoChannels->moChannels = std::move(oChannels);
+    mpoChannels->SetChannels(std::move(oChannels));
     mpoChannels->Commit(std::move(oOpened));
     SetOptimalTileSize(); // virtual: a derived writer may choose its own
 }
@@ -228,8 +218,7 @@ void BasicWriter::OpenDatasetOrCleanup(bool bBitmaps)
 void BasicWriter::CleanupDataset()
 {
     mpoChannels->Commit(detail::OpenedChannels());
-    if (mpoChannels->mbOwnsDataset)
-        delete std::exchange(mpoChannels->mpoDataset, nullptr);
+    mpoChannels->DropOwnedDataset();
 }
 
 void BasicWriter::LazyOpen()
@@ -247,7 +236,7 @@ void BasicWriter::OpenForWriting()
     }
     catch (const krv::Exception&)
     {
-        if (mpoChannels->mpoDataset->Exists())
+        if (GetDataset()->Exists())
             throw;
     }
 }
@@ -255,7 +244,8 @@ void BasicWriter::OpenForWriting()
 krv::gobs::Raster* BasicWriter::GetRaster(unsigned int nIndex)
 {
     LazyOpen();
-    std::unique_ptr<krv::gobs::Raster> oRaster = mpoChannels->MakeTile(nIndex, Place::Current());
+    std::unique_ptr<krv::gobs::Raster> oRaster =
+        detail::MakeRaster(*this, mpoChannels->GetOpened().moGrid.GetTiles().GetTile(nIndex), Place::Current());
     ReadRaster(oRaster.get());
     return oRaster.release();
 }
@@ -263,7 +253,7 @@ krv::gobs::Raster* BasicWriter::GetRaster(unsigned int nIndex)
 krv::gobs::Raster* BasicWriter::ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight)
 {
     LazyOpen();
-    std::unique_ptr<krv::gobs::Raster> oRaster = mpoChannels->MakeRaster(nX, nY, nWidth, nHeight, Place::Current());
+    std::unique_ptr<krv::gobs::Raster> oRaster = detail::MakeRaster(*this, {nX, nY, nWidth, nHeight}, Place::Current());
     ReadRaster(oRaster.get());
     return oRaster.release();
 }
@@ -290,8 +280,7 @@ void BasicWriter::SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarg
 IOverviewReaderAccessor* BasicWriter::GetOverviewReaderAccessor()
 {
     LazyOpen();
-    return new BasicOverviewReaderAccessor(dynamic_cast<IRasterDataset*>(mpoChannels->mpoDataset),
-                                           mpoChannels->moChannels);
+    return new BasicOverviewReaderAccessor(dynamic_cast<IRasterDataset*>(GetDataset()), GetChannels());
 }
 
 void BasicWriter::WriteRaster(const krv::gobs::Raster* poRaster)
@@ -305,23 +294,24 @@ void BasicWriter::WriteRaster(const krv::gobs::Raster* poRaster)
 
 bool BasicWriter::FileExists()
 {
-    return mpoChannels->mpoDataset->Exists();
+    return GetDataset()->Exists();
 }
 
 void BasicWriter::CreateNewFile(const krv::gobs::RasterInfo& oInfo)
 {
     const Place oPlace = Place::Current();
-    IDataset* const poDataset = mpoChannels->mpoDataset;
+    IDataset* const poDataset = GetDataset();
     auto& oRasterDataset = RequireFacet<IRasterDataset>(
         poDataset, "Format does not support rasters: format=" + FormatName(*poDataset), oPlace);
     Require(!poDataset->Exists(), "The dataset already exists", oPlace);
-    std::vector<unsigned int>& oChannels = mpoChannels->moChannels;
+    std::vector<unsigned int> oChannels = GetChannels();
     Require(oChannels.empty() || oChannels.size() == oInfo.GetChansCount(),
             "The RasterInfo does not match the write channels of this writer", oPlace);
     if (oChannels.empty())
     {
         oChannels.resize(oInfo.GetChansCount());
         std::iota(oChannels.begin(), oChannels.end(), 1u);
+        mpoChannels->SetChannels(std::move(oChannels));
     }
     oRasterDataset.Create(oInfo);
     OpenDataset(false);
@@ -330,11 +320,11 @@ void BasicWriter::CreateNewFile(const krv::gobs::RasterInfo& oInfo)
 void BasicWriter::SetAuxiliaryData(const AuxiliaryData& oData)
 {
     LazyOpen();
-    AuxiliaryData oRecord = mpoChannels->mpoDataset->ReadAuxiliaryData();
+    AuxiliaryData oRecord = GetDataset()->ReadAuxiliaryData();
     oRecord.SetFileMetadata(oData.GetFileMetadata());
-    auto* const poBitmaps = mpoChannels->mbBitmaps ? dynamic_cast<IBitmapDataset*>(mpoChannels->mpoDataset) : nullptr;
+    auto* const poBitmaps = mpoChannels->IsBitmaps() ? dynamic_cast<IBitmapDataset*>(GetDataset()) : nullptr;
     unsigned int nPosition = 0;
-    for (const unsigned int nChannel : mpoChannels->moChannels)
+    for (const unsigned int nChannel : GetChannels())
     {
         ++nPosition;
         const std::string description = oData.GetChannelDescription(nPosition);
@@ -347,7 +337,7 @@ void BasicWriter::SetAuxiliaryData(const AuxiliaryData& oData)
         oRecord.SetChanMetadata(oData.GetChanMetadata(nPosition), nChannel);
         oRecord.SetChannelDescription(description, nChannel);
     }
-    mpoChannels->mpoDataset->WriteAuxiliaryData(oRecord);
+    GetDataset()->WriteAuxiliaryData(oRecord);
 }
 
 void BasicWriter::SetCRS(const krv::ogc::cs::ICRS* poCRS)
@@ -355,29 +345,27 @@ void BasicWriter::SetCRS(const krv::ogc::cs::ICRS* poCRS)
     const Place oPlace = Place::Current();
     LazyOpen();
     Require(poCRS != nullptr, "The reference system is NULL", oPlace);
-    mpoChannels->mpoDataset->UpdateCRS(*poCRS);
+    GetDataset()->UpdateCRS(*poCRS);
 }
 
 void BasicWriter::SetGeocodingInfo(const krv::ogc::cs::GeocodingInfo& oInfo)
 {
     LazyOpen();
-    if (auto* const poGeocoded = dynamic_cast<IGeocodedDataset*>(mpoChannels->mpoDataset))
+    if (auto* const poGeocoded = dynamic_cast<IGeocodedDataset*>(GetDataset()))
         poGeocoded->SetGeocoding(oInfo);
 }
 
 IOverviewWriterAccessor* BasicWriter::GetOverviewWriterAccessor()
 {
     LazyOpen();
-    const bool bOnLevel = dynamic_cast<IOverviewIO*>(mpoChannels->moOpened.mpoRasterIO.get()) != nullptr;
-    if (bOnLevel || mpoChannels->mbBitmaps)
+    if (!mpoChannels->HasLevels())
         return nullptr;
-    return new BasicOverviewWriterAccessor(dynamic_cast<IRasterDataset*>(mpoChannels->mpoDataset),
-                                           mpoChannels->moChannels);
+    return new BasicOverviewWriterAccessor(dynamic_cast<IRasterDataset*>(GetDataset()), GetChannels());
 }
 
 void BasicWriter::Synchronize()
 {
-    mpoChannels->mpoDataset->Synchronize();
+    GetDataset()->Synchronize();
 }
 
 } // namespace krv::datasources

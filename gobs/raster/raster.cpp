@@ -1,6 +1,5 @@
 #include "gobs/raster/raster.h"
 
-#include "toolkit/core/hblock.h"
 #include "toolkit/exceptions/exceptions.h"
 
 namespace krv::gobs
@@ -20,25 +19,18 @@ std::uint64_t FullBytes(const RasterInfo& oInfo, const RasterContext& oContext, 
 
 Raster::Raster(const RasterInfo& oInfo, const RasterContext& oContext)
     : moInfo(oInfo), moContext(oContext), mnBufferSize(FullBytes(oInfo, oContext, Place::Current())),
-      mpBuffer(static_cast<unsigned char*>(HMalloc(mnBufferSize))), mbOwnsBuffer(true)
+      mpBuffer(static_cast<unsigned char*>(HMalloc(mnBufferSize)), {true})
 {
 }
 
 Raster::Raster(const RasterInfo& oInfo, const RasterContext& oContext, unsigned char* pBuffer, bool bTakeOwnership)
-    : moInfo(oInfo), moContext(oContext), mnBufferSize(0), mpBuffer(nullptr), mbOwnsBuffer(bTakeOwnership)
+    : moInfo(oInfo), moContext(oContext), mnBufferSize(0), mpBuffer(pBuffer, {bTakeOwnership})
 {
-    HBlock oOwned(bTakeOwnership ? pBuffer : nullptr);
     if (pBuffer == nullptr)
         throw DataException("pBuffer is NULL, cannot create a Raster on NULL", Place::AtLine(52));
     mnBufferSize = FullBytes(oInfo, oContext, Place::Current());
-    oOwned.release();
-    mpBuffer = pBuffer;
 }
 
-Raster::~Raster()
-{
-    if (mbOwnsBuffer)
-        HFree(mpBuffer);
-}
+Raster::~Raster() = default;
 
 } // namespace krv::gobs

@@ -2,6 +2,8 @@
 
 #include "gobs/api.h"
 #include "gobs/raster/rasterinfo.h"
+#include "toolkit/core/hblock.h"
+#include "toolkit/core/ownedorborrowed.h"
 
 #include <cstdint>
 
@@ -43,15 +45,14 @@ public:
     std::uint64_t GetFullHeight() const { return GetHeight() + 2ull * GetYMargin(); }
     std::uint64_t GetBufferSize() const { return mnBufferSize; }
 
-    unsigned char* GetBuffer() { return mpBuffer; }
-    const unsigned char* GetBuffer() const { return mpBuffer; }
+    unsigned char* GetBuffer() { return mpBuffer.get(); }
+    const unsigned char* GetBuffer() const { return mpBuffer.get(); }
 
 private:
     RasterInfo moInfo;
     RasterContext moContext;
     std::uint64_t mnBufferSize;
-    unsigned char* mpBuffer;
-    bool mbOwnsBuffer;
+    OwnedOrBorrowed<unsigned char, HBlockDeleter> mpBuffer;
 };
 
 } // namespace krv::gobs

@@ -4,9 +4,11 @@
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/ioverviewio.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/metadata/auxiliarydata.h"
+#include "datasources/reader/irasterreader.h"
 #include "gobs/raster/raster.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
@@ -66,10 +68,8 @@ void MeasureImage(OpenedChannels& oOpened, const Place& oPlace)
     const IRasterIO& oRasterIO = *oOpened.mpoRasterIO;
     oOpened.mnWidth = oRasterIO.GetFileWidth();
     oOpened.mnHeight = oRasterIO.GetFileHeight();
-    oOpened.mnTileWidth = oRasterIO.GetTileWidth();
-    oOpened.mnTileHeight = oRasterIO.GetTileHeight();
-    oOpened.moTiles = krv::gobs::TileIterator(oOpened.mnWidth, oOpened.mnHeight);
-    oOpened.moTiles.SetChunkSize(oOpened.mnTileWidth, oOpened.mnTileHeight);
+    oOpened.moGrid = TileGrid(oOpened.mnWidth, oOpened.mnHeight);
+    oOpened.moGrid.SetTileSize(oRasterIO.GetTileWidth(), oRasterIO.GetTileHeight());
 }
 
 } // namespace
@@ -90,6 +90,13 @@ void ChannelInfos::Add(std::unique_ptr<IChannelInfo> oInfo)
 {
     moInfos.push_back(nullptr);
     moInfos.back() = oInfo.release();
+}
+
+void TileGrid::SetTileSize(unsigned int nWidth, unsigned int nHeight)
+{
+    moTiles.SetChunkSize(nWidth, nHeight);
+    mnTileWidth = nWidth;
+    mnTileHeight = nHeight;
 }
 
 OpenedChannels::OpenedChannels() = default;
@@ -172,18 +179,35 @@ int ToPosition(long long nValue, const Place& oPlace)
     return static_cast<int>(nValue);
 }
 
+std::unique_ptr<krv::gobs::Raster> MakeRaster(const IRasterReader& oReader, const krv::gobs::Tile& oWindow,
+                                              const Place& oPlace)
+{
+    return std::make_unique<krv::gobs::Raster>(
+        krv::gobs::RasterInfo(oWindow.GetWidth(), oWindow.GetHeight(), oReader.GetChansCount(), oReader.GetDataType()),
+        krv::gobs::RasterContext(ToPosition(oWindow.GetX(), oPlace), ToPosition(oWindow.GetY(), oPlace),
+                                 oReader.GetXMargin(), oReader.GetYMargin()));
+}
+
 RasterChannels::~RasterChannels()
 {
     moOpened.mpoRasterIO.reset();
-    if (mbOwnsDataset)
-        delete mpoDataset;
+    mpoDataset.reset();
 }
 
-void RasterChannels::SetTileSize(unsigned int nWidth, unsigned int nHeight)
+void RasterChannels::SetDataset(OwnedOrBorrowed<IDataset> oDataset)
 {
-    moOpened.moTiles.SetChunkSize(nWidth, nHeight);
-    moOpened.mnTileWidth = nWidth;
-    moOpened.mnTileHeight = nHeight;
+    mpoDataset = std::move(oDataset);
+}
+
+void RasterChannels::DropOwnedDataset()
+{
+    if (mpoDataset.get_deleter().mbOwned)
+        mpoDataset.reset();
+}
+
+bool RasterChannels::HasLevels() const
+{
+    return !mbBitmaps && dynamic_cast<const IOverviewIO*>(moOpened.mpoRasterIO.get()) == nullptr;
 }
 
 void RasterChannels::SetOptimalTileSize()
@@ -202,20 +226,6 @@ void RasterChannels::SetMargins(unsigned int nXMargin, unsigned int nYMargin, eM
         throw krv::DataException("Margins can't be wider than half of the file", oPlace);
     mnXMargin = nXMargin;
     mnYMargin = nYMargin;
-}
-
-std::unique_ptr<krv::gobs::Raster> RasterChannels::MakeTile(unsigned int nIndex, const Place& oPlace) const
-{
-    const krv::gobs::Tile oTile = moOpened.moTiles.GetTile(nIndex);
-    return MakeRaster(oTile.GetX(), oTile.GetY(), oTile.GetWidth(), oTile.GetHeight(), oPlace);
-}
-
-std::unique_ptr<krv::gobs::Raster> RasterChannels::MakeRaster(unsigned int nX, unsigned int nY, unsigned int nWidth,
-                                                              unsigned int nHeight, const Place& oPlace) const
-{
-    const krv::gobs::RasterInfo oInfo(nWidth, nHeight, static_cast<unsigned int>(moChannels.size()), moOpened.moType);
-    const krv::gobs::RasterContext oContext(ToPosition(nX, oPlace), ToPosition(nY, oPlace), mnXMargin, mnYMargin);
-    return std::make_unique<krv::gobs::Raster>(oInfo, oContext);
 }
 
 void RasterChannels::Read(krv::gobs::Raster& oRaster, const Place& oPlace)
@@ -283,11 +293,11 @@ void RasterChannels::Write(const krv::gobs::Raster& oRaster, const Place& oPlace
 krv::ogc::cs::GeocodingInfo* RasterChannels::GetGeocodingInfo() const
 {
     using krv::ogc::cs::GeocodingInfo;
-    const auto* const poGeocoded = dynamic_cast<const IGeocodedDataset*>(mpoDataset);
+    const auto* const poGeocoded = dynamic_cast<const IGeocodedDataset*>(mpoDataset.get());
     if (poGeocoded == nullptr)
         return nullptr;
     const GeocodingInfo& oGeocoding = poGeocoded->GetGeocoding();
-    const auto* const poRasterDataset = dynamic_cast<const IRasterDataset*>(mpoDataset);
+    const auto* const poRasterDataset = dynamic_cast<const IRasterDataset*>(mpoDataset.get());
     if (poRasterDataset == nullptr || !IsOpen())
         return new GeocodingInfo(oGeocoding);
     const double nXRatio = static_cast<double>(poRasterDataset->GetWidth()) / moOpened.mpoRasterIO->GetFileWidth();
@@ -305,7 +315,7 @@ AuxiliaryData RasterChannels::GetAuxiliaryData() const
         return SelectChannelData(*mpoDataset, moChannels);
     AuxiliaryData oResult(static_cast<unsigned int>(moChannels.size()));
     oResult.SetFileMetadata(mpoDataset->ReadAuxiliaryData().GetFileMetadata());
-    const auto* const poBitmaps = dynamic_cast<const IBitmapDataset*>(mpoDataset);
+    const auto* const poBitmaps = dynamic_cast<const IBitmapDataset*>(mpoDataset.get());
     unsigned int nPosition = 0;
     for (const unsigned int nBitmap : moChannels)
     {

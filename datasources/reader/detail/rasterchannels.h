@@ -3,6 +3,7 @@
 #include "gobs/raster/datatype.h"
 #include "gobs/raster/margins.h"
 #include "gobs/tile/tileiterator.h"
+#include "toolkit/core/ownedorborrowed.h"
 #include "toolkit/exceptions/place.h"
 
 #include <memory>
@@ -11,7 +12,8 @@
 namespace krv::gobs
 {
 class Raster;
-}
+class Tile;
+} // namespace krv::gobs
 
 namespace krv::ogc::cs
 {
@@ -27,6 +29,7 @@ class IChannelInfo;
 class IDataset;
 class IRasterDataset;
 class IRasterIO;
+class IRasterReader;
 
 namespace detail
 {
@@ -47,6 +50,26 @@ private:
     std::vector<IChannelInfo*> moInfos;
 };
 
+// The tiles of an image, and the size of a tile as it was asked for.
+class TileGrid
+{
+public:
+    TileGrid() = default;
+    TileGrid(unsigned int nWidth, unsigned int nHeight) : moTiles(nWidth, nHeight) {}
+
+    // Throws DataException, and changes nothing, for a size that gives too many tiles.
+    void SetTileSize(unsigned int nWidth, unsigned int nHeight);
+    unsigned int GetTileWidth() const { return mnTileWidth; }
+    unsigned int GetTileHeight() const { return mnTileHeight; }
+    unsigned int GetCount() const { return moTiles.GetTileRange() + 1; }
+    const krv::gobs::TileIterator& GetTiles() const { return moTiles; }
+
+private:
+    krv::gobs::TileIterator moTiles{0, 0};
+    unsigned int mnTileWidth = 0;
+    unsigned int mnTileHeight = 0;
+};
+
 // Everything that becomes known when channels are opened; made as a whole or not at all.
 struct OpenedChannels
 {
@@ -58,11 +81,9 @@ struct OpenedChannels
     std::unique_ptr<IRasterIO> mpoRasterIO;
     ChannelInfos moInfos;
     krv::gobs::DataType moType;
-    krv::gobs::TileIterator moTiles{0, 0};
+    TileGrid moGrid;
     unsigned int mnWidth = 0;
     unsigned int mnHeight = 0;
-    unsigned int mnTileWidth = 0;
-    unsigned int mnTileHeight = 0;
 };
 
 // Opens image channels in the type of the first; a given I/O is used instead of the dataset's own and taken over.
@@ -85,6 +106,10 @@ AuxiliaryData SelectChannelData(IDataset& oDataset, const std::vector<unsigned i
 // The signed 32-bit number that a raster's position is; throws DataException when it is none.
 int ToPosition(long long nValue, const Place& oPlace);
 
+// An unfilled raster of a reader's type and channels with its current margins.
+std::unique_ptr<krv::gobs::Raster> MakeRaster(const IRasterReader& oReader, const krv::gobs::Tile& oWindow,
+                                              const Place& oPlace);
+
 // What readers and writers have in common: the dataset, the opened channels, the tile grid and the margins.
 class RasterChannels
 {
@@ -95,19 +120,30 @@ public:
     // Deletes the I/O, then the dataset if it is owned, then the descriptions.
     ~RasterChannels();
 
-    bool IsOpen() const { return moOpened.mpoRasterIO != nullptr; }
+    void SetDataset(OwnedOrBorrowed<IDataset> oDataset);
+    void SetOwned(bool bOwned) { mpoDataset.get_deleter().mbOwned = bOwned; }
+    // A dataset that is only borrowed stays.
+    void DropOwnedDataset();
+    void SetChannels(std::vector<unsigned int> oChannels) { moChannels = std::move(oChannels); }
+    // The numbers of the channels are those of bitmaps.
+    void SetBitmaps() { mbBitmaps = true; }
     void Commit(OpenedChannels oOpened) { moOpened = std::move(oOpened); }
 
-    unsigned int GetTileCount() const { return moOpened.moTiles.GetTileRange() + 1; }
-    void SetTileSize(unsigned int nWidth, unsigned int nHeight);
+    IDataset* GetDataset() const { return mpoDataset.get(); }
+    const std::vector<unsigned int>& GetChannels() const { return moChannels; }
+    bool IsBitmaps() const { return mbBitmaps; }
+    bool IsOpen() const { return moOpened.mpoRasterIO != nullptr; }
+    // Whether the dataset's levels are levels of these rasters, which are no bitmaps and no level.
+    bool HasLevels() const;
+    const OpenedChannels& GetOpened() const { return moOpened; }
+
+    void SetTileSize(unsigned int nWidth, unsigned int nHeight) { moOpened.moGrid.SetTileSize(nWidth, nHeight); }
     // Does nothing before the channels are open.
     void SetOptimalTileSize();
     void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour, const Place& oPlace);
-
-    // An unfilled raster of a tile or window with the current margins.
-    std::unique_ptr<krv::gobs::Raster> MakeTile(unsigned int nIndex, const Place& oPlace) const;
-    std::unique_ptr<krv::gobs::Raster> MakeRaster(unsigned int nX, unsigned int nY, unsigned int nWidth,
-                                                  unsigned int nHeight, const Place& oPlace) const;
+    unsigned int GetXMargin() const { return mnXMargin; }
+    unsigned int GetYMargin() const { return mnYMargin; }
+    eMarginBehaviour GetMarginBehaviour() const { return meMarginBehaviour; }
 
     // Fills a raster of the right count and type, margins by its own description. Margins that lie wholly inside the
     // image are read with it, the others are made afterwards by FillMargins.
@@ -121,8 +157,8 @@ public:
     krv::ogc::cs::GeocodingInfo* GetGeocodingInfo() const;
     AuxiliaryData GetAuxiliaryData() const;
 
-    IDataset* mpoDataset = nullptr; // deleted only when mbOwnsDataset
-    bool mbOwnsDataset = false;
+private:
+    OwnedOrBorrowed<IDataset> mpoDataset;
     bool mbBitmaps = false;
     std::vector<unsigned int> moChannels;
     OpenedChannels moOpened;
