@@ -1,8 +1,8 @@
 #include "tests/support/syntheticdataset.h"
 
 #include "datasources/interfaces/channelinfo.h"
-#include "datasources/interfaces/ioverviewio.h"
 #include "datasources/interfaces/ioverviewmanager.h"
+#include "datasources/interfaces/windowedio.h"
 #include "gobs/raster/rasterinfo.h"
 #include "tests/support/recipe.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -22,7 +22,7 @@ namespace
 
 // Serves a whole image that it holds in memory.
 template <class Interface>
-class MemoryIO : public Interface
+class MemoryIO : public WindowedIO<Interface>
 {
 public:
     MemoryIO(const ImageModel& oModel, ReferenceImage oImage)
@@ -35,36 +35,21 @@ public:
     unsigned int GetTileWidth() const override { return mnTileWidth; }
     unsigned int GetTileHeight() const override { return mnTileHeight; }
 
-    void ReadWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX, unsigned int nPartY,
-                    unsigned int nPartWidth, unsigned int nPartHeight, unsigned char* pBuffer) override
-    {
-        const std::size_t nBytes = moImage.mnPixelBytes * nWidth * nHeight;
-        const std::string oBuffer(reinterpret_cast<const char*>(pBuffer), nBytes);
-        const std::string oRead =
-            moImage.Part(oBuffer, nX, nY, nWidth, nHeight, nPartX, nPartY, nPartWidth, nPartHeight);
-        std::memcpy(pBuffer, oRead.data(), nBytes);
-    }
-
-    void ReadWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
-                    unsigned char* pBuffer) override
-    {
-        if (0ull + nX + nWidth > moImage.mnWidth || 0ull + nY + nHeight > moImage.mnHeight)
-            throw krv::DataException("synthetic: the window is not inside the image");
-        const std::string oRead = moImage.Window(nX, nY, nWidth, nHeight);
-        std::memcpy(pBuffer, oRead.data(), oRead.size());
-    }
-
-    void WriteWindow(int, int, unsigned int, unsigned int, unsigned int, unsigned int, unsigned int, unsigned int,
-                     unsigned char* const) override
-    {
-        throw krv::DataException("synthetic: read only");
-    }
-    void WriteWindow(unsigned int, unsigned int, unsigned int, unsigned int, unsigned char* const) override
-    {
-        throw krv::DataException("synthetic: read only");
-    }
-
 private:
+    std::size_t GetPixelBytes() const override { return moImage.mnPixelBytes; }
+    void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) override
+    {
+        for (unsigned int nRow = 0; nRow < oRect.mnHeight; ++nRow)
+        {
+            const std::string row = moImage.Window(oRect.mnX, oRect.mnY + nRow, oRect.mnWidth, 1);
+            std::memcpy(pTarget + nRow * nPitch, row.data(), row.size());
+        }
+    }
+    void WritePixels(const PixelRect&, const unsigned char*, std::size_t) override
+    {
+        throw krv::DataException("synthetic: read only");
+    }
+
     unsigned int mnTileWidth;
     unsigned int mnTileHeight;
     ReferenceImage moImage;

@@ -25,17 +25,6 @@ unsigned int CountBlocks(unsigned int nSize, unsigned int nBlock)
 
 } // namespace
 
-void CheckInside(std::int64_t nX, std::int64_t nY, unsigned int nWidth, unsigned int nHeight, unsigned int nImageWidth,
-                 unsigned int nImageHeight, const std::source_location& oLocation)
-{
-    if (nX >= 0 && nY >= 0 && nX + nWidth <= nImageWidth && nY + nHeight <= nImageHeight)
-        return;
-    throw DataException("The window " + std::to_string(nWidth) + " x " + std::to_string(nHeight) + " at " +
-                            std::to_string(nX) + ", " + std::to_string(nY) + " is not inside the image of " +
-                            std::to_string(nImageWidth) + " x " + std::to_string(nImageHeight),
-                        Place::Current(oLocation));
-}
-
 ImageLayout::ImageLayout(unsigned int nWidth, unsigned int nHeight, unsigned int nBlockWidth, unsigned int nBlockHeight,
                          std::vector<Plane> oPlanes, const Place& oPlace)
     : mnWidth(nWidth), mnHeight(nHeight), mnBlockWidth(nBlockWidth), mnBlockHeight(nBlockHeight),

@@ -1,11 +1,11 @@
 #pragma once
 
+#include "datasources/interfaces/windowedio.h"
 #include "gobs/raster/datatype.h"
 #include "toolkit/exceptions/place.h"
 
 #include <cstddef>
 #include <cstdint>
-#include <source_location>
 #include <vector>
 
 namespace krv::plugins::support
@@ -22,20 +22,7 @@ struct Plane
     krv::gobs::DataType moNativeType;
 };
 
-// A rectangle of pixels inside an image or a block.
-struct PixelRect
-{
-    unsigned int mnX = 0;
-    unsigned int mnY = 0;
-    unsigned int mnWidth = 0;
-    unsigned int mnHeight = 0;
-
-    friend bool operator==(const PixelRect&, const PixelRect&) = default;
-};
-
-// Throws DataException when a window does not lie inside an image. Positions may be negative.
-void CheckInside(std::int64_t nX, std::int64_t nY, unsigned int nWidth, unsigned int nHeight, unsigned int nImageWidth,
-                 unsigned int nImageHeight, const std::source_location& oLocation);
+using krv::datasources::PixelRect;
 
 // Where a channel lies: its plane, and its position among the plane's channels, both from 0.
 struct ChannelPlace

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "datasources/interfaces/ioverviewio.h"
+#include "datasources/interfaces/windowedio.h"
 #include "plugins/support/image/blockimage.h"
 
 #include <memory>
@@ -9,10 +9,9 @@
 namespace krv::plugins::support
 {
 
-// The transfer of windows for a list of channels of a block image, with all checks of arguments: sizes in 64 bits, a
-// part outside its window, null buffers; the part is clipped to the image. Base is IRasterIO or IOverviewIO.
+// The transfer of windows for a list of channels of a block image. Base is IRasterIO or IOverviewIO.
 template <typename Base>
-class BlockRasterIO : public Base
+class BlockRasterIO : public krv::datasources::WindowedIO<Base>
 {
 public:
     BlockRasterIO(std::shared_ptr<BlockImage> poImage, const std::vector<unsigned int>& oChannels,
@@ -24,17 +23,11 @@ public:
     unsigned int GetTileWidth() const override;
     unsigned int GetTileHeight() const override;
 
-    void ReadWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX, unsigned int nPartY,
-                    unsigned int nPartWidth, unsigned int nPartHeight, unsigned char* pBuffer) override;
-    void ReadWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
-                    unsigned char* pBuffer) override;
-    void WriteWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
-                     unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
-                     unsigned char* const pBuffer) override;
-    void WriteWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
-                     unsigned char* const pBuffer) override;
-
 private:
+    std::size_t GetPixelBytes() const override;
+    void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) override;
+    void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) override;
+
     std::shared_ptr<BlockImage> mpoImage;
     ChannelSelection moChannels;
     // What readers are told to use: the layout's, but never more than 64 MiB for all channels together.

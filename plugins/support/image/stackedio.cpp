@@ -4,7 +4,6 @@
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
-#include <cstdint>
 
 namespace krv::plugins::support
 {
@@ -42,83 +41,49 @@ unsigned int StackedIO::GetTileHeight() const
     return moParts.front()->GetTileHeight();
 }
 
-// What of the caller's part lies in the image is taken in slices: each channel as a window of just that slice, since
-// what lies outside has to stay as it is.
+// Slices of rows, whose planes one after the other pass through the scratch memory.
 template <typename Action>
-void StackedIO::ForEachSlice(int nX, int nY, unsigned int nWidth, unsigned int nHeight, const PixelRect& oPart,
-                             const unsigned char* pBuffer, Action oAction)
+void StackedIO::ForEachSlice(const PixelRect& oRect, const Action& oAction)
 {
-    if (pBuffer == nullptr)
-        throw DataException("The buffer is NULL");
-    if (std::uint64_t{oPart.mnX} + oPart.mnWidth > nWidth || std::uint64_t{oPart.mnY} + oPart.mnHeight > nHeight)
-        throw DataException("The part is not inside its window");
-    const std::int64_t nLeft = std::max<std::int64_t>(0, std::int64_t{nX} + oPart.mnX);
-    const std::int64_t nTop = std::max<std::int64_t>(0, std::int64_t{nY} + oPart.mnY);
-    const std::int64_t nRight = std::min<std::int64_t>(GetFileWidth(), std::int64_t{nX} + oPart.mnX + oPart.mnWidth);
-    const std::int64_t nBottom = std::min<std::int64_t>(GetFileHeight(), std::int64_t{nY} + oPart.mnY + oPart.mnHeight);
-    if (nLeft >= nRight || nTop >= nBottom)
-        return;
-    const auto nCutWidth = static_cast<unsigned int>(nRight - nLeft);
-    const std::size_t nPlanePitch = std::size_t{nCutWidth} * mnValueBytes;
-    const std::size_t nPitch = std::size_t{nWidth} * mnValueBytes * moParts.size();
-    const auto nSlice = static_cast<std::int64_t>(std::max<std::size_t>(1, (std::size_t{1} << 20) / nPlanePitch));
-    for (std::int64_t nRow = nTop; nRow < nBottom; nRow += nSlice)
+    const std::size_t nPlanePitch = std::size_t{oRect.mnWidth} * mnValueBytes;
+    const auto nSlice = static_cast<unsigned int>(std::max<std::size_t>(1, (std::size_t{1} << 20) / nPlanePitch));
+    for (unsigned int nRow = 0; nRow < oRect.mnHeight; nRow += std::min(nSlice, oRect.mnHeight - nRow))
     {
-        const auto nRows = static_cast<unsigned int>(std::min(nSlice, nBottom - nRow));
-        const std::size_t nBegin = static_cast<std::size_t>(nRow - nY) * nPitch +
-                                   static_cast<std::size_t>(nLeft - nX) * mnValueBytes * moParts.size();
+        const unsigned int nRows = std::min(nSlice, oRect.mnHeight - nRow);
         for (std::size_t nAt = 0; nAt < moParts.size(); ++nAt)
-            oAction(nAt, PixelRect{static_cast<unsigned int>(nLeft), static_cast<unsigned int>(nRow), nCutWidth, nRows},
-                    moScratch.Get(nPlanePitch * nRows), nPlanePitch, nBegin, nPitch);
+            oAction(nAt, PixelRect{oRect.mnX, oRect.mnY + nRow, oRect.mnWidth, nRows},
+                    moScratch.Get(nPlanePitch * nRows), nPlanePitch);
     }
 }
 
-void StackedIO::ReadWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
-                           unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
-                           unsigned char* pBuffer)
+void StackedIO::ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch)
 {
     if (moParts.size() == 1)
-        return moParts.front()->ReadWindow(nX, nY, nWidth, nHeight, nPartX, nPartY, nPartWidth, nPartHeight, pBuffer);
-    ForEachSlice(nX, nY, nWidth, nHeight, {nPartX, nPartY, nPartWidth, nPartHeight}, pBuffer,
-                 [&](std::size_t nAt, const PixelRect& oRect, unsigned char* pPlane, std::size_t nPlanePitch,
-                     std::size_t nBegin, std::size_t nPitch)
+        return moParts.front()->ReadWindow(static_cast<int>(oRect.mnX), static_cast<int>(oRect.mnY),
+                                           static_cast<unsigned int>(nPitch / mnValueBytes), oRect.mnHeight, 0, 0,
+                                           oRect.mnWidth, oRect.mnHeight, pTarget);
+    ForEachSlice(oRect,
+                 [&](std::size_t nAt, const PixelRect& oSlice, unsigned char* pPlane, std::size_t nPlanePitch)
                  {
-                     moParts[nAt]->ReadWindow(oRect.mnX, oRect.mnY, oRect.mnWidth, oRect.mnHeight, pPlane);
-                     codec::PlaceChannel(pPlane, nPlanePitch, pBuffer + nBegin, nPitch, nAt, moParts.size(),
-                                         {oRect.mnWidth, oRect.mnHeight, mnValueBytes});
+                     moParts[nAt]->ReadWindow(oSlice.mnX, oSlice.mnY, oSlice.mnWidth, oSlice.mnHeight, pPlane);
+                     codec::PlaceChannel(pPlane, nPlanePitch, pTarget + (oSlice.mnY - oRect.mnY) * nPitch, nPitch, nAt,
+                                         moParts.size(), {oSlice.mnWidth, oSlice.mnHeight, mnValueBytes});
                  });
 }
 
-void StackedIO::ReadWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
-                           unsigned char* pBuffer)
-{
-    CheckInside(nX, nY, nWidth, nHeight, GetFileWidth(), GetFileHeight(), std::source_location::current());
-    ReadWindow(static_cast<int>(nX), static_cast<int>(nY), nWidth, nHeight, 0, 0, nWidth, nHeight, pBuffer);
-}
-
-void StackedIO::WriteWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
-                            unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
-                            unsigned char* const pBuffer)
+void StackedIO::WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch)
 {
     if (moParts.size() == 1)
-        return moParts.front()->WriteWindow(nX, nY, nWidth, nHeight, nPartX, nPartY, nPartWidth, nPartHeight, pBuffer);
-    CheckInside(std::int64_t{nX} + nPartX, std::int64_t{nY} + nPartY, nPartWidth, nPartHeight, GetFileWidth(),
-                GetFileHeight(), std::source_location::current());
-    ForEachSlice(nX, nY, nWidth, nHeight, {nPartX, nPartY, nPartWidth, nPartHeight}, pBuffer,
-                 [&](std::size_t nAt, const PixelRect& oRect, unsigned char* pPlane, std::size_t nPlanePitch,
-                     std::size_t nBegin, std::size_t nPitch)
+        return moParts.front()->WriteWindow(static_cast<int>(oRect.mnX), static_cast<int>(oRect.mnY),
+                                            static_cast<unsigned int>(nPitch / mnValueBytes), oRect.mnHeight, 0, 0,
+                                            oRect.mnWidth, oRect.mnHeight, const_cast<unsigned char*>(pSource));
+    ForEachSlice(oRect,
+                 [&](std::size_t nAt, const PixelRect& oSlice, unsigned char* pPlane, std::size_t nPlanePitch)
                  {
-                     codec::ExtractChannel(pBuffer + nBegin, nPitch, nAt, moParts.size(), pPlane, nPlanePitch,
-                                           {oRect.mnWidth, oRect.mnHeight, mnValueBytes});
-                     moParts[nAt]->WriteWindow(oRect.mnX, oRect.mnY, oRect.mnWidth, oRect.mnHeight, pPlane);
+                     codec::ExtractChannel(pSource + (oSlice.mnY - oRect.mnY) * nPitch, nPitch, nAt, moParts.size(),
+                                           pPlane, nPlanePitch, {oSlice.mnWidth, oSlice.mnHeight, mnValueBytes});
+                     moParts[nAt]->WriteWindow(oSlice.mnX, oSlice.mnY, oSlice.mnWidth, oSlice.mnHeight, pPlane);
                  });
-}
-
-void StackedIO::WriteWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
-                            unsigned char* const pBuffer)
-{
-    CheckInside(nX, nY, nWidth, nHeight, GetFileWidth(), GetFileHeight(), std::source_location::current());
-    WriteWindow(static_cast<int>(nX), static_cast<int>(nY), nWidth, nHeight, 0, 0, nWidth, nHeight, pBuffer);
 }
 
 } // namespace krv::plugins::support

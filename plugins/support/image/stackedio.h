@@ -1,6 +1,5 @@
 #pragma once
 
-#include "datasources/interfaces/ioverviewio.h"
 #include "plugins/support/image/imagelayout.h"
 #include "plugins/support/image/scratch.h"
 
@@ -11,7 +10,7 @@ namespace krv::plugins::support
 {
 
 // Several one-channel I/O objects of the same image size and type, read and written as the channels of one.
-class StackedIO : public krv::datasources::IOverviewIO
+class StackedIO : public krv::datasources::WindowedIO<krv::datasources::IOverviewIO>
 {
 public:
     // nValueBytes: bytes of one value of the common type. nLevel: what GetLevel answers; 1 for full size.
@@ -26,20 +25,12 @@ public:
     unsigned int GetTileHeight() const override;
     unsigned int GetLevel() const override { return mnLevel; }
 
-    void ReadWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX, unsigned int nPartY,
-                    unsigned int nPartWidth, unsigned int nPartHeight, unsigned char* pBuffer) override;
-    void ReadWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
-                    unsigned char* pBuffer) override;
-    void WriteWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
-                     unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
-                     unsigned char* const pBuffer) override;
-    void WriteWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
-                     unsigned char* const pBuffer) override;
-
 private:
+    std::size_t GetPixelBytes() const override { return moParts.size() * mnValueBytes; }
+    void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) override;
+    void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) override;
     template <typename Action>
-    void ForEachSlice(int nX, int nY, unsigned int nWidth, unsigned int nHeight, const PixelRect& oPart,
-                      const unsigned char* pBuffer, Action oAction);
+    void ForEachSlice(const PixelRect& oRect, const Action& oAction);
 
     std::vector<std::unique_ptr<krv::datasources::IRasterIO>> moParts;
     unsigned int mnValueBytes;

@@ -1,0 +1,60 @@
+#pragma once
+
+#include "datasources/interfaces/ioverviewio.h"
+#include "toolkit/exceptions/place.h"
+
+#include <cstddef>
+#include <cstdint>
+
+namespace krv::datasources
+{
+
+// A rectangle of pixels inside an image or a block.
+struct PixelRect
+{
+    unsigned int mnX = 0;
+    unsigned int mnY = 0;
+    unsigned int mnWidth = 0;
+    unsigned int mnHeight = 0;
+
+    friend bool operator==(const PixelRect&, const PixelRect&) = default;
+};
+
+// The arithmetic of windows against an image, with its checks: null buffers, sizes that overflow, a part outside its
+// window, a window outside the image. What is left for a derived class to transfer is a rectangle inside the image.
+// Base is IRasterIO or IOverviewIO.
+template <typename Base>
+class KRV_DATASOURCES_API WindowedIO : public Base
+{
+public:
+    ~WindowedIO() override;
+
+    void ReadWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX, unsigned int nPartY,
+                    unsigned int nPartWidth, unsigned int nPartHeight, unsigned char* pBuffer) final;
+    void ReadWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
+                    unsigned char* pBuffer) final;
+    void WriteWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
+                     unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
+                     unsigned char* const pBuffer) final;
+    void WriteWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
+                     unsigned char* const pBuffer) final;
+
+private:
+    // Of one pixel with all its channels.
+    virtual std::size_t GetPixelBytes() const = 0;
+    // A rectangle with pixels, inside the image; its row r lies at the pointer + r * nPitch bytes.
+    virtual void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) = 0;
+    virtual void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) = 0;
+
+    struct Transfer;
+
+    Transfer Cut(std::int64_t nX, std::int64_t nY, unsigned int nWidth, unsigned int nHeight, const PixelRect& oPart,
+                 unsigned char* pBuffer, bool bInside, const krv::Place& oPlace) const;
+    void Read(const Transfer& oTransfer);
+    void Write(const Transfer& oTransfer);
+};
+
+extern template class WindowedIO<IRasterIO>;
+extern template class WindowedIO<IOverviewIO>;
+
+} // namespace krv::datasources
