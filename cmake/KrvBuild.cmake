@@ -119,7 +119,7 @@ endfunction()
 # krv_average_kernels(VARIABLE): the source files of the inner loops of averages, with the options that they want. These
 # hold for the folder that calls this: the loops are no part of a library's interface, whoever wants them compiles them in.
 function(krv_average_kernels variable)
-  set(folder ${CMAKE_SOURCE_DIR}/datasources/writer/detail)
+  set(folder ${CMAKE_SOURCE_DIR}/gobs/resampling/detail)
   set(sources ${folder}/averagekernels.cpp ${folder}/averagekernelsavx2.cpp ${folder}/averagekernelsavx512.cpp)
   set_source_files_properties(${sources} PROPERTIES COMPILE_OPTIONS
     "-O3;-fno-math-errno;-fno-trapping-math;-Wno-psabi")

@@ -7,12 +7,12 @@
 #include "benchmarks/support/measure.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/iomanager/datasetmanager.h"
+#include "datasources/overviews/overviewbuilder.h"
 #include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/writer/basicwriter.h"
-#include "datasources/writer/detail/levelreducer.h"
-#include "datasources/writer/detail/leveltarget.h"
-#include "datasources/writer/overviewbuilder.h"
 #include "gobs/raster/raster.h"
+#include "gobs/resampling/levelreducer.h"
+#include "gobs/resampling/leveltarget.h"
 
 #include <fcntl.h>
 #include <immintrin.h>
@@ -41,7 +41,6 @@ namespace
 using namespace krv::benchmarks;
 using krv::datasources::BasicWriter;
 using krv::datasources::DatasetManager;
-namespace detail = krv::datasources::detail;
 
 const std::vector<unsigned int> LEVELS = {2, 4, 8, 16, 32};
 
@@ -181,19 +180,19 @@ void ReadOnce(const std::vector<unsigned char>& oBytes)
 void AverageTiles(const std::vector<unsigned char>& oBytes, const krv::gobs::DataType& oType, unsigned int nChannels,
                   unsigned int nWidth, unsigned int nHeight, const std::vector<unsigned int>& oLevels)
 {
-    const detail::SourceForm oForm{nWidth, nHeight, nChannels, oType, false};
-    std::vector<std::unique_ptr<detail::LevelTarget>> oTargets;
-    std::vector<detail::LevelTask> oTasks;
+    const krv::gobs::SourceForm oForm{nWidth, nHeight, nChannels, oType, false};
+    std::vector<std::unique_ptr<krv::gobs::LevelTarget>> oTargets;
+    std::vector<krv::gobs::LevelTask> oTasks;
     for (const unsigned int nLevel : oLevels)
     {
-        const detail::PixelBounds oBounds{0, 0, nWidth / nLevel, nHeight / nLevel};
-        oTargets.push_back(std::make_unique<detail::LevelTarget>(
-            detail::TileGatherer(oBounds, 256, 256, nChannels, oType,
-                                 [](const krv::gobs::Raster& oTile) { Keep(oTile.GetBuffer()); }),
+        const krv::gobs::PixelBounds oBounds{0, 0, nWidth / nLevel, nHeight / nLevel};
+        oTargets.push_back(std::make_unique<krv::gobs::LevelTarget>(
+            krv::gobs::TileGatherer(oBounds, 256, 256, nChannels, oType,
+                                    [](const krv::gobs::Raster& oTile) { Keep(oTile.GetBuffer()); }),
             oForm, nullptr));
         oTasks.push_back({nLevel, oBounds, oTargets.back().get()});
     }
-    const auto oReducer = detail::MakeAverageCascade(oForm, oTasks, {0, 0, nWidth, nHeight}, false);
+    const auto oReducer = krv::gobs::MakeAverageCascade(oForm, oTasks, {0, 0, nWidth, nHeight}, false);
     const std::size_t nTileBytes = 256 * 256 * oForm.GetPixelBytes();
     const unsigned char* pTile = oBytes.data();
     for (unsigned int nY = 0; nY < nHeight; nY += 256)

@@ -5,7 +5,8 @@
 BEGIN {
     # The order of the layers; includes go to a smaller number or stay in the folder.
     split("toolkit gobs datasources/api.h datasources/interfaces datasources/metadata datasources/iomanager " \
-          "datasources/reader datasources/writer datasources/maskbuilder datasources/datasets operations", order, " ");
+          "datasources/reader datasources/writer datasources/overviews datasources/maskbuilder datasources/datasets " \
+          "operations", order, " ");
     for (n in order)
         rank[order[n]] = n + 0; # the subscripts of an array are texts
     rank["datasources/formatregistrar"] = rank["datasources/reader"];

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "datasources/writer/detail/samplevectors.h"
+#include "gobs/resampling/detail/samplevectors.h"
 
 #include <algorithm>
 #include <cmath>
@@ -10,7 +10,7 @@
 #include <cstring>
 #include <type_traits>
 
-namespace krv::datasources::detail
+namespace krv::gobs::detail
 {
 
 // Of 4 values in order: one that occurs twice, the smallest of several, else the smallest.
@@ -136,4 +136,4 @@ inline T ModeOf(T* pValues, std::size_t nValues)
     return static_cast<T>(nMode + T(0));
 }
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs::detail

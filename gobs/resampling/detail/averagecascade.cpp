@@ -1,20 +1,22 @@
-#include "datasources/writer/detail/averagekernels.h"
-#include "datasources/writer/detail/levelreducer.h"
-#include "datasources/writer/detail/leveltarget.h"
-#include "datasources/writer/detail/samplemath.h"
-#include "datasources/writer/detail/samplevectors.h"
 #include "gobs/raster/pixelvalue.h"
+#include "gobs/resampling/detail/averagekernels.h"
+#include "gobs/resampling/detail/samplemath.h"
+#include "gobs/resampling/detail/samplevectors.h"
+#include "gobs/resampling/levelreducer.h"
+#include "gobs/resampling/leveltarget.h"
 
 #include <algorithm>
 #include <bit>
 #include <cmath>
 #include <cstring>
 
-namespace krv::datasources::detail
+namespace krv::gobs
 {
 
 namespace
 {
+
+using namespace detail;
 
 // Sums of boxes, or samples of the image, and for each how many samples are in
 // it: bytes for the image; null without validity.
@@ -243,7 +245,7 @@ private:
            });
     }
 
-    krv::gobs::NativeDataTypeCode meType;
+    NativeDataTypeCode meType;
     unsigned int mnSamples;
 };
 
@@ -254,7 +256,7 @@ class MaskedSteps : public IAverageSteps
 {
 public:
     MaskedSteps(const SourceForm& oForm, bool bHalfValid)
-        : moSums(oForm), moCounts({oForm.mnWidth, oForm.mnHeight, oForm.mnChannels, krv::gobs::eDT_8U, false}),
+        : moSums(oForm), moCounts({oForm.mnWidth, oForm.mnHeight, oForm.mnChannels, eDT_8U, false}),
           mnSamples(oForm.mnChannels), mbHalfValid(bHalfValid)
     {
     }
@@ -387,17 +389,17 @@ std::unique_ptr<IAverageSteps> MakeSteps(const SourceForm& oForm, bool bHalfVali
 {
     const bool bVectors = oForm.GetSamples() <= MOST_LOOP_SAMPLES;
     const auto eType = oForm.moType.GetNativeCode();
-    if (bVectors && eType == krv::gobs::eDT_8U)
+    if (bVectors && eType == eDT_8U)
         return MakeVectorSteps<std::uint8_t>(oForm, bHalfValid);
-    if (bVectors && eType == krv::gobs::eDT_16U)
+    if (bVectors && eType == eDT_16U)
         return MakeVectorSteps<std::uint16_t>(oForm, bHalfValid);
-    if (bVectors && eType == krv::gobs::eDT_32R)
+    if (bVectors && eType == eDT_32R)
         return MakeVectorSteps<float>(oForm, bHalfValid);
     const auto Make = [&]<class T>(std::type_identity<T>) -> std::unique_ptr<IAverageSteps>
     {
         return std::make_unique<AnySteps<T>>(oForm, bHalfValid);
     };
-    return krv::gobs::VisitPartType(oForm.moType, Make);
+    return VisitPartType(oForm.moType, Make);
 }
 
 // Rows of a stage wait for the one below them in a slot of their own; the slots
@@ -669,4 +671,4 @@ std::unique_ptr<ILevelReducer> MakeAverageCascade(const SourceForm& oForm, const
     return std::make_unique<AverageCascade>(oForm, oTasks, oBounds, bHalfValid);
 }
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs

@@ -1,14 +1,15 @@
 #pragma once
 
-#include "datasources/writer/overviewbuilder.h"
+#include "gobs/api.h"
 #include "gobs/raster/datatype.h"
+#include "gobs/resampling/resampling.h"
 
 #include <algorithm>
 #include <cstdint>
 #include <memory>
 #include <vector>
 
-namespace krv::datasources::detail
+namespace krv::gobs
 {
 
 class LevelTarget;
@@ -53,7 +54,7 @@ struct SourceForm
     unsigned int mnWidth; // of the image
     unsigned int mnHeight;
     unsigned int mnChannels;
-    krv::gobs::DataType moType;
+    DataType moType;
     bool mbValidity; // windows may come with validity
 
     std::size_t GetPixelBytes() const { return moType.GetValueBits() / 8 * mnChannels; }
@@ -69,33 +70,38 @@ struct LevelTask
     LevelTarget* mpoTarget;
 };
 
+// How a value of a level is made of those that go into it.
+struct ReductionRule
+{
+    Resampling meMethod = Resampling::eAverage;
+    bool mbHalfValid = false; // box methods: valid only when at least half of the box is, instead of a single value
+    bool mbPower = false; // complex averages: the magnitude is the root of the mean power, the phase that of the mean
+};
+
 // Takes the pixels of the image window by window, row of windows by row of
 // windows, and puts the pixels of levels into their targets as soon as they are
 // known.
-class ILevelReducer
+class KRV_GOBS_API ILevelReducer
 {
 public:
     virtual ~ILevelReducer();
     virtual void Add(const SourceWindow& oWindow) = 0;
 };
 
-// Averages of factors that are powers of two up to 32768, one made from the
-// sums of the other. Windows begin and end at multiples of the largest factor
-// on the x axis, or at the image's edge. oBounds: all the pixels that will
-// come.
-std::unique_ptr<ILevelReducer> MakeAverageCascade(const SourceForm& oForm, const std::vector<LevelTask>& oTasks,
-                                                  const PixelBounds& oBounds, bool bHalfValid);
+// Whether levels of a factor are averages that one cascade makes together: factors that are powers of two up to 32768.
+KRV_GOBS_API bool IsInCascade(const SourceForm& oForm, const ReductionRule& oRule, unsigned int nFactor);
 
-// Every other level. Windows have all the columns that the level needs.
-std::unique_ptr<ILevelReducer> MakeBoxReducer(const SourceForm& oForm, const LevelTask& oTask, Resampling eMethod,
-                                              const OverviewOptions& oOptions);
-std::unique_ptr<ILevelReducer> MakeKernelReducer(const SourceForm& oForm, const LevelTask& oTask, Resampling eMethod);
+// All levels of a cascade, one made from the unrounded sums of the other. Windows begin and end at multiples of the
+// largest factor on the x axis, or at the image's edge. oBounds: all the pixels that will come.
+KRV_GOBS_API std::unique_ptr<ILevelReducer> MakeAverageCascade(const SourceForm& oForm,
+                                                               const std::vector<LevelTask>& oTasks,
+                                                               const PixelBounds& oBounds, bool bHalfValid);
 
-// Pixels of the level beyond those whose boxes are touched that a changed pixel
-// of the image has a part in.
-unsigned int GetKernelRadius(Resampling eMethod);
+// Any single level. Windows have all the columns that the level needs.
+KRV_GOBS_API std::unique_ptr<ILevelReducer> MakeLevelReducer(const SourceForm& oForm, const LevelTask& oTask,
+                                                             const ReductionRule& oRule);
 
 // The pixels of the image that a part of a level depends on.
-PixelBounds GetSourceBounds(const SourceForm& oForm, const LevelTask& oTask, Resampling eMethod);
+KRV_GOBS_API PixelBounds GetSourceBounds(const SourceForm& oForm, const LevelTask& oTask, Resampling eMethod);
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs

@@ -4,7 +4,7 @@
 
 #include <cstddef>
 
-namespace krv::datasources::detail
+namespace krv::gobs::detail
 {
 
 // One step of a cascade over a block: pixel (x, y) of the result is the sum of the four pixels from (2x, 2y) on.
@@ -30,15 +30,15 @@ using ReduceLoop = void (*)(const ReduceJob& oJob);
 // The loop for this processor: for pixels of 1 to MOST_LOOP_SAMPLES samples of 8U, 16U or 32R, from samples or sums of
 // nSourceBytes to sums of nSumBytes each. Unsigned integers add up in 2, 4 or 8 bytes, reals in doubles. Null for
 // anything else.
-ReduceLoop FindReduceLoop(krv::gobs::NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
+ReduceLoop FindReduceLoop(NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
                           std::size_t nSumBytes);
 
 // The same, compiled for one instruction set.
-ReduceLoop FindBaselineLoop(krv::gobs::NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
+ReduceLoop FindBaselineLoop(NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
                             std::size_t nSumBytes);
-ReduceLoop FindAvx2Loop(krv::gobs::NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
+ReduceLoop FindAvx2Loop(NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
                         std::size_t nSumBytes);
-ReduceLoop FindAvx512Loop(krv::gobs::NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
+ReduceLoop FindAvx512Loop(NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
                           std::size_t nSumBytes);
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs::detail

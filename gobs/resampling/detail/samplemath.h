@@ -6,7 +6,7 @@
 #include <limits>
 #include <type_traits>
 
-namespace krv::datasources::detail
+namespace krv::gobs::detail
 {
 
 __extension__ using Integer128 = __int128;
@@ -63,4 +63,4 @@ inline T MeanOf(Sum nSum, std::uint64_t nCount)
     }
 }
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs::detail

@@ -4,7 +4,7 @@
 // its own, so everything here is local to the file and calls nothing that is not: a function that the linker shares
 // could be the other file's. Vectors are those of the compiler; intrinsics stand where it does not find the way.
 
-#include "datasources/writer/detail/averagekernels.h"
+#include "gobs/resampling/detail/averagekernels.h"
 
 #include <cstdint>
 #include <cstring>
@@ -15,7 +15,7 @@
 #include <immintrin.h>
 #endif
 
-namespace krv::datasources::detail
+namespace krv::gobs::detail
 {
 
 namespace
@@ -287,14 +287,13 @@ inline ReduceLoop FindFor(unsigned int nSamples)
     return nSamples >= 1 && nSamples <= 4 ? LOOPS[nSamples - 1] : nullptr;
 }
 
-inline ReduceLoop Find(krv::gobs::NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
-                       std::size_t nSumBytes)
+inline ReduceLoop Find(NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes, std::size_t nSumBytes)
 {
     using std::uint16_t, std::uint32_t, std::uint64_t, std::uint8_t;
     const std::size_t nStep = nSourceBytes * 10 + nSumBytes;
     switch (eType)
     {
-    case krv::gobs::eDT_8U:
+    case eDT_8U:
         return nStep == 12   ? FindFor<uint8_t, uint16_t, uint8_t>(nSamples)
                : nStep == 22 ? FindFor<uint16_t, uint16_t, uint8_t>(nSamples)
                : nStep == 24 ? FindFor<uint16_t, uint32_t, uint8_t>(nSamples)
@@ -302,13 +301,13 @@ inline ReduceLoop Find(krv::gobs::NativeDataTypeCode eType, unsigned int nSample
                : nStep == 48 ? FindFor<uint32_t, uint64_t, uint8_t>(nSamples)
                : nStep == 88 ? FindFor<uint64_t, uint64_t, uint8_t>(nSamples)
                              : nullptr;
-    case krv::gobs::eDT_16U:
+    case eDT_16U:
         return nStep == 24   ? FindFor<uint16_t, uint32_t, uint16_t>(nSamples)
                : nStep == 44 ? FindFor<uint32_t, uint32_t, uint16_t>(nSamples)
                : nStep == 48 ? FindFor<uint32_t, uint64_t, uint16_t>(nSamples)
                : nStep == 88 ? FindFor<uint64_t, uint64_t, uint16_t>(nSamples)
                              : nullptr;
-    case krv::gobs::eDT_32R:
+    case eDT_32R:
         return nStep == 48   ? FindFor<float, double, float>(nSamples)
                : nStep == 88 ? FindFor<double, double, float>(nSamples)
                              : nullptr;
@@ -319,4 +318,4 @@ inline ReduceLoop Find(krv::gobs::NativeDataTypeCode eType, unsigned int nSample
 
 } // namespace
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs::detail

@@ -1,6 +1,6 @@
 // The inner loops of averages for every instruction set that this processor has, against the rule written out.
 
-#include "datasources/writer/detail/averagekernels.h"
+#include "gobs/resampling/detail/averagekernels.h"
 
 #include <gtest/gtest.h>
 
@@ -16,7 +16,7 @@ namespace krv::test
 namespace
 {
 
-using namespace krv::datasources::detail;
+using namespace krv::gobs::detail;
 using Find = decltype(&FindBaselineLoop);
 __extension__ using Wide = __int128;
 

@@ -1,17 +1,17 @@
-#include "datasources/writer/detail/averagekernels.h"
+#include "gobs/resampling/detail/averagekernels.h"
 
-#include "datasources/writer/detail/averagekernelcode.h"
+#include "gobs/resampling/detail/averagekernelcode.h"
 
-namespace krv::datasources::detail
+namespace krv::gobs::detail
 {
 
-ReduceLoop FindBaselineLoop(krv::gobs::NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
+ReduceLoop FindBaselineLoop(NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
                             std::size_t nSumBytes)
 {
     return Find(eType, nSamples, nSourceBytes, nSumBytes);
 }
 
-ReduceLoop FindReduceLoop(krv::gobs::NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
+ReduceLoop FindReduceLoop(NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
                           std::size_t nSumBytes)
 {
 #if defined(__x86_64__)
@@ -24,4 +24,4 @@ ReduceLoop FindReduceLoop(krv::gobs::NativeDataTypeCode eType, unsigned int nSam
     return FindBaselineLoop(eType, nSamples, nSourceBytes, nSumBytes);
 }
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs::detail

@@ -1,29 +1,20 @@
 #pragma once
 
-#include "datasources/writer/detail/leveltarget.h"
+#include "datasources/overviews/overviewbuilder.h"
 #include "gobs/mask/imaskbuilder.h"
+#include "gobs/raster/raster.h"
+#include "gobs/resampling/nodatasamples.h"
 
 #include <memory>
 #include <vector>
 
 namespace krv::datasources
 {
-class AuxiliaryData;
 class IRasterWriter;
-} // namespace krv::datasources
+}
 
 namespace krv::datasources::detail
 {
-
-// Finds samples that are not valid by themselves in a row that begins with the first channel.
-class ISampleTest
-{
-public:
-    virtual ~ISampleTest();
-    virtual bool FindsAny(const unsigned char* pSamples, std::size_t nSamples) const = 0;
-    // Writes a byte per sample, 1 when it is valid and else 0.
-    virtual void Mark(const unsigned char* pSamples, std::size_t nSamples, unsigned char* pValid) const = 0;
-};
 
 // Which samples of a writer's rasters take part in levels: those of valid
 // pixels that are not their own channel's no-data value.
@@ -36,6 +27,8 @@ public:
 
     // Whether there is anything that could make a sample invalid.
     bool IsNeeded() const { return mpoPixels != nullptr || mpoTest != nullptr || !moChannels.empty(); }
+    // Of the writer's channels.
+    const krv::gobs::NoDataNumbers& GetNoData() const { return moNoData; }
     // The number of the mask bitmap that takes part, or 0.
     unsigned int GetBitmap() const { return mnBitmap; }
     // A byte per value of the raster, which has no margins; null when all are valid. Good until the next call.
@@ -50,25 +43,22 @@ private:
         std::unique_ptr<const krv::gobs::IMaskBuilder> mpoNoData;
     };
 
-    void AddChannels(const AuxiliaryData& oMetadata, const krv::gobs::DataType& oType, bool bNaN);
+    void AddChannels(const krv::gobs::DataType& oType, bool bNaN);
     void MarkSamples(const krv::gobs::Raster& oRaster);
     void MarkPixels(const krv::gobs::Raster& oRaster);
     void MarkChannel(const krv::gobs::Raster& oRaster, const Channel& oChannel);
     unsigned char* GetRow(std::size_t nRow);
     const unsigned char* FillRows();
 
+    krv::gobs::NoDataNumbers moNoData;
     std::unique_ptr<const krv::gobs::IMaskBuilder> mpoOwned;
     const krv::gobs::IMaskBuilder* mpoPixels = nullptr;
-    std::unique_ptr<const ISampleTest> mpoTest; // of plain types
-    std::vector<Channel> moChannels;            // of complex ones
+    std::unique_ptr<const krv::gobs::ISampleTest> mpoTest; // of plain types
+    std::vector<Channel> moChannels;                       // of complex ones
     unsigned int mnBitmap = 0;
     std::vector<unsigned char> moBytes;
     std::vector<unsigned char> moRows;
     std::size_t mnValues = 0; // of a row
 };
-
-// For values of the writer's channels; null when all are always valid.
-std::unique_ptr<IValueFinisher> MakeValueFinisher(const AuxiliaryData& oMetadata, const SourceForm& oForm,
-                                                  bool bNaNIsNoData);
 
 } // namespace krv::datasources::detail

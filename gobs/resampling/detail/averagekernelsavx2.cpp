@@ -2,16 +2,16 @@
 #if !defined(__AVX2__)
 #error "This file is compiled for AVX2 alone; the caller asks the processor first."
 #endif
-#include "datasources/writer/detail/averagekernelcode.h"
+#include "gobs/resampling/detail/averagekernelcode.h"
 
-namespace krv::datasources::detail
+namespace krv::gobs::detail
 {
 
-ReduceLoop FindAvx2Loop(krv::gobs::NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
+ReduceLoop FindAvx2Loop(NativeDataTypeCode eType, unsigned int nSamples, std::size_t nSourceBytes,
                         std::size_t nSumBytes)
 {
     return Find(eType, nSamples, nSourceBytes, nSumBytes);
 }
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs::detail
 #endif

@@ -1,4 +1,4 @@
-#include "datasources/writer/overviewbuilder.h"
+#include "datasources/overviews/overviewbuilder.h"
 
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/writer/basicwriter.h"

@@ -1,7 +1,8 @@
 #pragma once
 
-#include "datasources/writer/detail/levelreducer.h"
 #include "gobs/raster/raster.h"
+#include "gobs/resampling/levelreducer.h"
+#include "gobs/resampling/nodatasamples.h"
 
 #include <cstdint>
 #include <functional>
@@ -10,18 +11,18 @@
 #include <utility>
 #include <vector>
 
-namespace krv::datasources::detail
+namespace krv::gobs
 {
 
 // Gathers rows of pixels into the tiles of a grid and stores each tile when the
 // last of its pixels has come. Every pixel of the bounds comes once.
-class TileGatherer
+class KRV_GOBS_API TileGatherer
 {
 public:
-    using Store = std::function<void(const krv::gobs::Raster& oTile)>;
+    using Store = std::function<void(const Raster& oTile)>;
 
     TileGatherer(const PixelBounds& oBounds, unsigned int nTileWidth, unsigned int nTileHeight, unsigned int nChannels,
-                 const krv::gobs::DataType& oType, Store oStore);
+                 const DataType& oType, Store oStore);
 
     // Memory for a block of pixels that lie in one tile and within the bounds; null for others.
     unsigned char* Find(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight)
@@ -47,7 +48,7 @@ private:
     struct Tile
     {
         PixelBounds moPart; // of the level
-        std::unique_ptr<krv::gobs::Raster> mpoRaster;
+        std::unique_ptr<Raster> mpoRaster;
         std::uint64_t mnMissing = 0; // pixels
     };
 
@@ -66,28 +67,16 @@ private:
     unsigned int mnTileWidth;
     unsigned int mnTileHeight;
     unsigned int mnChannels;
-    krv::gobs::DataType moType;
+    DataType moType;
     std::size_t mnPixelBytes;
     Store moStore;
     std::map<std::pair<unsigned int, unsigned int>, Tile> moTiles; // that have begun, by row and column
     Tile* mpoLast = nullptr;                                       // the one used last: rows come in runs
 };
 
-// Gives values that are not valid a value, and keeps valid ones apart from the
-// no-data value.
-class IValueFinisher
-{
-public:
-    virtual ~IValueFinisher();
-    // Values from the first channel on; pValid: a byte per value, or null when all are valid.
-    virtual void Finish(unsigned char* pValues, const unsigned char* pValid, std::size_t nValues) const = 0;
-    // Whether it has something to do where all are valid.
-    virtual bool ChangesValid() const = 0;
-};
-
 // Where the pixels of a level go, and those of the mask's level when there is
 // one.
-class LevelTarget
+class KRV_GOBS_API LevelTarget
 {
 public:
     LevelTarget(TileGatherer oPixels, const SourceForm& oForm, const IValueFinisher* poFinisher);
@@ -133,4 +122,4 @@ private:
     unsigned char* mpDirect = nullptr;
 };
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs

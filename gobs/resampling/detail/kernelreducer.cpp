@@ -1,7 +1,7 @@
-#include "datasources/writer/detail/levelreducer.h"
-#include "datasources/writer/detail/leveltarget.h"
-#include "datasources/writer/detail/samplemath.h"
 #include "gobs/raster/pixelvalue.h"
+#include "gobs/resampling/detail/reducers.h"
+#include "gobs/resampling/detail/samplemath.h"
+#include "gobs/resampling/leveltarget.h"
 #include "toolkit/raster/convertvalue.h"
 
 #include <algorithm>
@@ -9,7 +9,7 @@
 #include <cstring>
 #include <map>
 
-namespace krv::datasources::detail
+namespace krv::gobs::detail
 {
 
 namespace
@@ -234,7 +234,7 @@ std::unique_ptr<ILevelReducer> MakeKernelReducer(const SourceForm& oForm, const 
     {
         return std::make_unique<KernelReducer<T>>(oForm, oTask, eMethod);
     };
-    return krv::gobs::VisitPartType(oForm.moType, Make);
+    return VisitPartType(oForm.moType, Make);
 }
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs::detail

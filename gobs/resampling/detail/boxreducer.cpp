@@ -1,8 +1,8 @@
-#include "datasources/writer/detail/levelreducer.h"
-#include "datasources/writer/detail/leveltarget.h"
-#include "datasources/writer/detail/modeof.h"
-#include "datasources/writer/detail/samplemath.h"
 #include "gobs/raster/pixelvalue.h"
+#include "gobs/resampling/detail/modeof.h"
+#include "gobs/resampling/detail/reducers.h"
+#include "gobs/resampling/detail/samplemath.h"
+#include "gobs/resampling/leveltarget.h"
 #include "toolkit/raster/convertvalue.h"
 
 #include <algorithm>
@@ -10,7 +10,7 @@
 #include <cmath>
 #include <cstring>
 
-namespace krv::datasources::detail
+namespace krv::gobs::detail
 {
 
 namespace
@@ -418,11 +418,10 @@ private:
 };
 
 template <typename T, unsigned int P>
-std::unique_ptr<ILevelReducer> MakeFor(const SourceForm& oForm, const LevelTask& oTask, Resampling eMethod,
-                                       const OverviewOptions& oOptions)
+std::unique_ptr<ILevelReducer> MakeFor(const SourceForm& oForm, const LevelTask& oTask, const ReductionRule& oRule)
 {
-    const bool bHalf = oOptions.mbHalfValid;
-    switch (eMethod)
+    const bool bHalf = oRule.mbHalfValid;
+    switch (oRule.meMethod)
     {
     case Resampling::eRms:
         return std::make_unique<BoxReducer<T, P, PowerBox<T, P>>>(oForm, oTask, bHalf);
@@ -433,7 +432,7 @@ std::unique_ptr<ILevelReducer> MakeFor(const SourceForm& oForm, const LevelTask&
     case Resampling::eMode:
         return std::make_unique<BoxReducer<T, P, ModeBox<T, P>>>(oForm, oTask, bHalf);
     default:
-        if (P == 2 && oOptions.mbPower)
+        if (P == 2 && oRule.mbPower)
             return std::make_unique<BoxReducer<T, P, PowerBox<T, P>>>(oForm, oTask, bHalf);
         return std::make_unique<BoxReducer<T, P, AverageBox<T, P>>>(oForm, oTask, bHalf);
     }
@@ -441,16 +440,16 @@ std::unique_ptr<ILevelReducer> MakeFor(const SourceForm& oForm, const LevelTask&
 
 } // namespace
 
-std::unique_ptr<ILevelReducer> MakeBoxReducer(const SourceForm& oForm, const LevelTask& oTask, Resampling eMethod,
-                                              const OverviewOptions& oOptions)
+std::unique_ptr<ILevelReducer> MakeBoxReducer(const SourceForm& oForm, const LevelTask& oTask,
+                                              const ReductionRule& oRule)
 {
-    if (eMethod == Resampling::eNearest)
+    if (oRule.meMethod == Resampling::eNearest)
         return std::make_unique<NearestReducer>(oForm, oTask);
     const auto Make = [&]<class Value>(std::type_identity<Value>)
     {
-        return MakeFor<krv::gobs::PartOf<Value>, krv::gobs::PARTS_OF<Value>>(oForm, oTask, eMethod, oOptions);
+        return MakeFor<PartOf<Value>, PARTS_OF<Value>>(oForm, oTask, oRule);
     };
-    return krv::gobs::VisitPixelType(oForm.moType, Make);
+    return VisitPixelType(oForm.moType, Make);
 }
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs::detail

@@ -1,25 +1,27 @@
-#include "datasources/writer/detail/levelreducer.h"
+#include "gobs/resampling/levelreducer.h"
+
+#include "gobs/resampling/detail/reducers.h"
 
 #include <algorithm>
+#include <bit>
 
-namespace krv::datasources::detail
+namespace krv::gobs
 {
 
 ILevelReducer::~ILevelReducer() = default;
 
-unsigned int GetKernelRadius(Resampling eMethod)
+bool IsInCascade(const SourceForm& oForm, const ReductionRule& oRule, unsigned int nFactor)
 {
-    switch (eMethod)
-    {
-    case Resampling::eBilinear:
-        return 1;
-    case Resampling::eCubic:
-        return 2;
-    case Resampling::eLanczos:
-        return 3;
-    default:
-        return 0;
-    }
+    constexpr unsigned int MOST_FACTOR = 32768;
+    return oRule.meMethod == Resampling::eAverage && std::has_single_bit(nFactor) && nFactor <= MOST_FACTOR &&
+           !(oForm.moType.IsComplex() && oRule.mbPower);
+}
+
+std::unique_ptr<ILevelReducer> MakeLevelReducer(const SourceForm& oForm, const LevelTask& oTask,
+                                                const ReductionRule& oRule)
+{
+    return GetKernelRadius(oRule.meMethod) != 0 ? detail::MakeKernelReducer(oForm, oTask, oRule.meMethod)
+                                                : detail::MakeBoxReducer(oForm, oTask, oRule);
 }
 
 // A kernel reaches radius * factor from the centre of a box, of which half a
@@ -42,4 +44,4 @@ PixelBounds GetSourceBounds(const SourceForm& oForm, const LevelTask& oTask, Res
             End(oPart.mnBottom, oForm.mnHeight)};
 }
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs

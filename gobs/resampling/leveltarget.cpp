@@ -1,21 +1,19 @@
-#include "datasources/writer/detail/leveltarget.h"
+#include "gobs/resampling/leveltarget.h"
 
 #include <algorithm>
 #include <cstring>
 #include <utility>
 
-namespace krv::datasources::detail
+namespace krv::gobs
 {
 
 TileGatherer::TileGatherer(const PixelBounds& oBounds, unsigned int nTileWidth, unsigned int nTileHeight,
-                           unsigned int nChannels, const krv::gobs::DataType& oType, Store oStore)
+                           unsigned int nChannels, const DataType& oType, Store oStore)
     : moBounds(oBounds), mnTileWidth(std::max(nTileWidth, 1U)), mnTileHeight(std::max(nTileHeight, 1U)),
       mnChannels(nChannels), moType(oType), mnPixelBytes(oType.GetValueBits() / 8 * nChannels),
       moStore(std::move(oStore))
 {
 }
-
-IValueFinisher::~IValueFinisher() = default;
 
 TileGatherer::Tile& TileGatherer::Get(unsigned int nX, unsigned int nY)
 {
@@ -30,9 +28,9 @@ TileGatherer::Tile& TileGatherer::Get(unsigned int nX, unsigned int nY)
     oTile.moPart = GetPart(nColumn, nRow);
     const unsigned int nWidth = oTile.moPart.GetWidth();
     const unsigned int nHeight = oTile.moPart.GetHeight();
-    oTile.mpoRaster = std::make_unique<krv::gobs::Raster>(
-        krv::gobs::RasterInfo(nWidth, nHeight, mnChannels, moType),
-        krv::gobs::RasterContext(static_cast<int>(oTile.moPart.mnLeft), static_cast<int>(oTile.moPart.mnTop)));
+    oTile.mpoRaster = std::make_unique<Raster>(
+        RasterInfo(nWidth, nHeight, mnChannels, moType),
+        RasterContext(static_cast<int>(oTile.moPart.mnLeft), static_cast<int>(oTile.moPart.mnTop)));
     oTile.mnMissing = std::uint64_t{nWidth} * nHeight;
     return oTile;
 }
@@ -59,7 +57,7 @@ unsigned char* TileGatherer::FindTile(unsigned int nX, unsigned int nY, unsigned
 void TileGatherer::StoreLast()
 {
     const PixelBounds oPart = mpoLast->moPart;
-    const std::unique_ptr<krv::gobs::Raster> oRaster = std::move(mpoLast->mpoRaster);
+    const std::unique_ptr<Raster> oRaster = std::move(mpoLast->mpoRaster);
     mpoLast = nullptr;
     moTiles.erase({oPart.mnTop / mnTileHeight, oPart.mnLeft / mnTileWidth});
     moStore(*oRaster);
@@ -116,4 +114,4 @@ void LevelTarget::EndRows(const unsigned char* pValid)
     }
 }
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs

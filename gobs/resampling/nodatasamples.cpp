@@ -1,48 +1,21 @@
-#include "datasources/writer/detail/samplevalidity.h"
+#include "gobs/resampling/nodatasamples.h"
 
-#include "datasources/metadata/auxiliarydata.h"
-#include "datasources/metadata/typednodata.h"
-#include "datasources/reader/idatasetaccess.h"
-#include "datasources/reader/validitysource.h"
-#include "datasources/writer/detail/samplevectors.h"
-#include "datasources/writer/irasterwriter.h"
-#include "gobs/mask/exactmaskdecision.h"
-#include "gobs/mask/mask.h"
 #include "gobs/mask/samplematch.h"
 #include "gobs/raster/pixelvalue.h"
-#include "toolkit/nspio/warning.h"
+#include "gobs/resampling/detail/samplevectors.h"
 
 #include <algorithm>
 #include <cmath>
 #include <cstring>
 #include <limits>
 #include <type_traits>
+#include <utility>
 
-namespace krv::datasources::detail
+namespace krv::gobs
 {
 
 namespace
 {
-
-using krv::gobs::ExactMaskDecision;
-using krv::gobs::IMaskBuilder;
-using krv::gobs::Mask;
-
-std::unique_ptr<ValiditySource> MakeSource(IRasterWriter& oWriter)
-{
-    const auto* const poAccess = dynamic_cast<const IDatasetAccess*>(&oWriter);
-    if (poAccess != nullptr && poAccess->GetDataset() != nullptr)
-        return std::make_unique<ValiditySource>(poAccess->GetDataset(), poAccess->GetChannels());
-    krv::nspio::Warning::Warn("Overviews: the writer does not show its dataset, so that a validity mask and an alpha "
-                              "channel that is not among the written ones take no part",
-                              "datasources/writer/overviewbuilder", 0);
-    return std::make_unique<ValiditySource>(oWriter);
-}
-
-bool IsSet(const unsigned char* pBits, std::size_t nBit)
-{
-    return (pBits[nBit / 8] & 128u >> nBit % 8) != 0;
-}
 
 template <typename T>
 T Beside(T nValue)
@@ -64,12 +37,12 @@ struct ChannelRule
 };
 
 template <typename T>
-std::vector<ChannelRule<T>> MakeRules(const AuxiliaryData& oMetadata, unsigned int nChannels, bool bNaNIsNoData)
+std::vector<ChannelRule<T>> MakeRules(const NoDataNumbers& oNumbers, bool bNaNIsNoData)
 {
     std::vector<ChannelRule<T>> oRules;
-    for (unsigned int nChannel = 1; nChannel <= nChannels; ++nChannel)
+    for (const std::optional<SampleValue>& oNumber : oNumbers)
     {
-        const krv::gobs::SampleMatch<T> oMatch(GetTypedNoData(oMetadata, nChannel));
+        const SampleMatch<T> oMatch(oNumber);
         ChannelRule<T> oRule{oMatch.IsSet(), oMatch.GetValue(), oMatch.GetValue() != oMatch.GetValue()};
         if (bNaNIsNoData && std::is_floating_point_v<T>)
         {
@@ -96,9 +69,9 @@ template <typename T>
 class Pattern
 {
 public:
-    using Samples = typename VectorsOf<T>::Samples;
-    using Bits = typename VectorsOf<T>::Bits;
-    static constexpr std::size_t LANES = VectorsOf<T>::LANES;
+    using Samples = typename detail::VectorsOf<T>::Samples;
+    using Bits = typename detail::VectorsOf<T>::Bits;
+    static constexpr std::size_t LANES = detail::VectorsOf<T>::LANES;
 
     explicit Pattern(const std::vector<ChannelRule<T>>& oRules) : moVectors(oRules.size())
     {
@@ -113,8 +86,9 @@ public:
             oNaN.push_back(static_cast<BitsOf<T>>(oRule.mbNaN ? ~BitsOf<T>(0) : BitsOf<T>(0)));
         }
         for (std::size_t n = 0; n < moVectors.size(); ++n)
-            moVectors[n] = {LoadVector<Samples>(&oValues[n * LANES]), LoadVector<Samples>(&oBeside[n * LANES]),
-                            LoadVector<Bits>(&oSet[n * LANES]), LoadVector<Bits>(&oNaN[n * LANES])};
+            moVectors[n] = {detail::LoadVector<Samples>(&oValues[n * LANES]),
+                            detail::LoadVector<Samples>(&oBeside[n * LANES]),
+                            detail::LoadVector<Bits>(&oSet[n * LANES]), detail::LoadVector<Bits>(&oNaN[n * LANES])};
     }
 
     // All bits set in the lanes of samples that equal their channel's value, or are NaN where that counts.
@@ -180,7 +154,7 @@ public:
                    {
                        const Bits oFound = MatchAt(pSamples + nAt * sizeof(T), nCount, nVector);
                        const auto oValid =
-                           (__builtin_convertvector(oFound, typename VectorsOf<T>::Valid) & std::uint8_t(1)) ^
+                           (__builtin_convertvector(oFound, typename detail::VectorsOf<T>::Valid) & std::uint8_t(1)) ^
                            std::uint8_t(1);
                        std::memcpy(pValid + nAt, &oValid, nCount);
                    });
@@ -193,7 +167,7 @@ private:
     Bits MatchAt(const unsigned char* pSamples, std::size_t nCount, std::size_t nVector) const
     {
         if (nCount == Pattern<T>::LANES)
-            return moPattern.Match(LoadVector<Samples>(pSamples), nVector);
+            return moPattern.Match(detail::LoadVector<Samples>(pSamples), nVector);
         Samples oSamples{};
         std::memcpy(&oSamples, pSamples, nCount * sizeof(T));
         Bits oFound = moPattern.Match(oSamples, nVector);
@@ -250,7 +224,7 @@ public:
 private:
     using Bits = typename Pattern<T>::Bits;
     using Samples = typename Pattern<T>::Samples;
-    using Valid = typename VectorsOf<T>::Valid;
+    using Valid = typename detail::VectorsOf<T>::Valid;
 
     Pattern<T> moPattern;
     bool mbChangesValid;
@@ -295,151 +269,32 @@ private:
 
 ISampleTest::~ISampleTest() = default;
 
-SampleValidity::SampleValidity(IRasterWriter& oWriter, const OverviewOptions& oOptions)
-    : mpoPixels(oOptions.mpoValidity)
+IValueFinisher::~IValueFinisher() = default;
+
+std::unique_ptr<ISampleTest> MakeSampleTest(const DataType& oType, const NoDataNumbers& oNumbers, bool bNaNIsNoData)
 {
-    const AuxiliaryData oMetadata = oWriter.GetAuxiliaryData();
-    if (mpoPixels == nullptr)
+    const auto Make = [&]<class T>(std::type_identity<T>) -> std::unique_ptr<ISampleTest>
     {
-        std::unique_ptr<ValiditySource> oSource = MakeSource(oWriter);
-        mnBitmap = oSource->GetBitmap();
-        // Where every channel has a value of its own, its samples say all that the pixels could.
-        bool bAllSaid = true;
-        for (unsigned int nChannel = 1; nChannel <= oMetadata.GetChannelCount(); ++nChannel)
-            bAllSaid = bAllSaid && GetTypedNoData(oMetadata, nChannel).has_value();
-        if (oSource->HasBitmap() || oSource->HasAlpha() || (oSource->HasNoData() && !bAllSaid))
-        {
-            mpoOwned = std::move(oSource);
-            mpoPixels = mpoOwned.get();
-        }
-    }
-    AddChannels(oMetadata, oWriter.GetDataType(), oOptions.mbNaNIsNoData);
+        const auto oRules = MakeRules<T>(oNumbers, bNaNIsNoData);
+        const bool bAny = std::any_of(oRules.begin(), oRules.end(), [](const auto& oRule) { return oRule.mbNoData; });
+        return bAny ? std::make_unique<SampleTest<T>>(oRules) : nullptr;
+    };
+    return VisitPartType(oType, Make);
 }
 
-SampleValidity::~SampleValidity() = default;
-
-void SampleValidity::AddChannels(const AuxiliaryData& oMetadata, const krv::gobs::DataType& oType, bool bNaN)
-{
-    if (!oType.IsComplex())
-    {
-        const auto Make = [&]<class T>(std::type_identity<T>) -> std::unique_ptr<ISampleTest>
-        {
-            const auto oRules = MakeRules<T>(oMetadata, oMetadata.GetChannelCount(), bNaN);
-            const bool bAny =
-                std::any_of(oRules.begin(), oRules.end(), [](const auto& oRule) { return oRule.mbNoData; });
-            return bAny ? std::make_unique<SampleTest<T>>(oRules) : nullptr;
-        };
-        mpoTest = krv::gobs::VisitPartType(oType, Make);
-        return;
-    }
-    for (unsigned int nChannel = 1; nChannel <= oMetadata.GetChannelCount(); ++nChannel)
-    {
-        std::optional<NoDataValue> oValue = GetTypedNoData(oMetadata, nChannel);
-        const bool bAddNaN = bNaN && oType.IsReal();
-        if (!oValue && !bAddNaN)
-            continue;
-        if (!oValue)
-            oValue = NoDataValue::FromReal(std::numeric_limits<double>::quiet_NaN());
-        const ExactMaskDecision oDecision(krv::gobs::eAnyChannel, {*oValue}, {nChannel}, bAddNaN);
-        moChannels.push_back({nChannel - 1, std::make_unique<krv::gobs::MaskDecisionBuilder>(&oDecision)});
-    }
-}
-
-const unsigned char* SampleValidity::Mark(const krv::gobs::Raster& oRaster)
-{
-    mnValues = std::size_t{oRaster.GetWidth()} * oRaster.GetChansCount();
-    moRows.assign(oRaster.GetHeight(), 0);
-    if (mpoTest != nullptr)
-        MarkSamples(oRaster);
-    if (mpoPixels != nullptr)
-        MarkPixels(oRaster);
-    for (const Channel& oChannel : moChannels)
-        MarkChannel(oRaster, oChannel);
-    return std::find(moRows.begin(), moRows.end(), 1) != moRows.end() ? FillRows() : nullptr;
-}
-
-// Rows without anything invalid are written last, and only when there are others.
-const unsigned char* SampleValidity::FillRows()
-{
-    moBytes.resize(std::max(moBytes.size(), mnValues * moRows.size()));
-    for (std::size_t nRow = 0; nRow < moRows.size(); ++nRow)
-        if (moRows[nRow] == 0)
-            std::memset(moBytes.data() + nRow * mnValues, 1, mnValues);
-    return moBytes.data();
-}
-
-unsigned char* SampleValidity::GetRow(std::size_t nRow)
-{
-    moBytes.resize(std::max(moBytes.size(), mnValues * moRows.size()));
-    unsigned char* const pRow = moBytes.data() + nRow * mnValues;
-    if (moRows[nRow] == 0)
-        std::memset(pRow, 1, mnValues);
-    moRows[nRow] = 1;
-    return pRow;
-}
-
-void SampleValidity::MarkSamples(const krv::gobs::Raster& oRaster)
-{
-    const std::size_t nRowBytes = mnValues * (oRaster.GetDataType().GetValueBits() / 8);
-    for (std::size_t nRow = 0; nRow < moRows.size(); ++nRow)
-    {
-        const unsigned char* const pSamples = oRaster.GetBuffer() + nRow * nRowBytes;
-        if (mpoTest->FindsAny(pSamples, mnValues))
-            mpoTest->Mark(pSamples, mnValues, GetRow(nRow));
-    }
-}
-
-void SampleValidity::MarkPixels(const krv::gobs::Raster& oRaster)
-{
-    const std::unique_ptr<Mask> oMask(mpoPixels->BuildMask(oRaster));
-    const std::size_t nPixels = oRaster.GetWidth();
-    if (oMask->CountSet() == nPixels * moRows.size())
-        return;
-    const std::size_t nChannels = oRaster.GetChansCount();
-    for (std::size_t nRow = 0; nRow < moRows.size(); ++nRow)
-    {
-        unsigned char* pRow = moRows[nRow] != 0 ? GetRow(nRow) : nullptr;
-        for (std::size_t n = 0, nBit = nRow * nPixels; n < nPixels;)
-        {
-            if ((nBit + n) % 8 == 0 && n + 8 <= nPixels && oMask->GetBits()[(nBit + n) / 8] == 0xFF)
-            {
-                n += 8;
-                continue;
-            }
-            if (!IsSet(oMask->GetBits(), nBit + n))
-            {
-                pRow = pRow != nullptr ? pRow : GetRow(nRow);
-                std::memset(pRow + n * nChannels, 0, nChannels);
-            }
-            ++n;
-        }
-    }
-}
-
-void SampleValidity::MarkChannel(const krv::gobs::Raster& oRaster, const Channel& oChannel)
-{
-    const std::unique_ptr<Mask> oMask(oChannel.mpoNoData->BuildMask(oRaster));
-    const std::size_t nPixels = oRaster.GetWidth();
-    for (std::size_t n = 0; n < nPixels * moRows.size(); ++n)
-        if (IsSet(oMask->GetBits(), n))
-            GetRow(n / nPixels)[n % nPixels * oRaster.GetChansCount() + oChannel.mnPosition] = 0;
-}
-
-std::unique_ptr<IValueFinisher> MakeValueFinisher(const AuxiliaryData& oMetadata, const SourceForm& oForm,
+std::unique_ptr<IValueFinisher> MakeValueFinisher(const DataType& oType, const NoDataNumbers& oNumbers,
                                                   bool bNaNIsNoData)
 {
-    if (!oForm.mbValidity)
-        return nullptr;
     const auto Make = [&]<class Value>(std::type_identity<Value>) -> std::unique_ptr<IValueFinisher>
     {
-        using T = krv::gobs::PartOf<Value>;
-        auto oRules = MakeRules<T>(oMetadata, oForm.mnChannels, bNaNIsNoData);
-        if constexpr (krv::gobs::PARTS_OF<Value> == 2)
+        using T = PartOf<Value>;
+        auto oRules = MakeRules<T>(oNumbers, bNaNIsNoData);
+        if constexpr (PARTS_OF<Value> == 2)
             return std::make_unique<ComplexFinisher<T>>(std::move(oRules));
         else
             return std::make_unique<ValueFinisher<T>>(oRules);
     };
-    return krv::gobs::VisitPixelType(oForm.moType, Make);
+    return VisitPixelType(oType, Make);
 }
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs

@@ -6,10 +6,8 @@
 #include <cstdint>
 #include <cstring>
 
-namespace krv::datasources::detail
+namespace krv::gobs::detail
 {
-
-using krv::gobs::BitsOf;
 
 // Vectors of the compiler, such as every processor has: of samples, of numbers as wide as they are, of as many bytes.
 template <typename T>
@@ -30,4 +28,4 @@ inline V LoadVector(const void* p)
     return o;
 }
 
-} // namespace krv::datasources::detail
+} // namespace krv::gobs::detail

@@ -1,4 +1,4 @@
-#include "datasources/writer/overviewbuilder.h"
+#include "datasources/overviews/overviewbuilder.h"
 
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
@@ -6,17 +6,17 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/metadata/auxiliarydata.h"
+#include "datasources/overviews/detail/samplevalidity.h"
 #include "datasources/reader/idatasetaccess.h"
-#include "datasources/writer/detail/levelreducer.h"
-#include "datasources/writer/detail/leveltarget.h"
-#include "datasources/writer/detail/samplevalidity.h"
 #include "datasources/writer/ioverviewwriteraccessor.h"
 #include "datasources/writer/irasterwriter.h"
+#include "gobs/resampling/levelreducer.h"
+#include "gobs/resampling/leveltarget.h"
+#include "gobs/resampling/nodatasamples.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
 #include <bit>
-#include <cctype>
 #include <numeric>
 
 namespace krv::datasources
@@ -25,14 +25,17 @@ namespace krv::datasources
 namespace
 {
 
-using detail::LevelTask;
-using detail::PixelBounds;
-using detail::SourceForm;
+using krv::gobs::ILevelReducer;
+using krv::gobs::IValueFinisher;
+using krv::gobs::LevelTarget;
+using krv::gobs::LevelTask;
+using krv::gobs::PixelBounds;
 using krv::gobs::Raster;
+using krv::gobs::ReductionRule;
+using krv::gobs::SourceForm;
+using krv::gobs::TileGatherer;
 
-constexpr const char* NAMES[] = {"NEAREST", "AVERAGE", "MODE", "BILINEAR", "CUBIC", "LANCZOS", "RMS", "MIN", "MAX"};
 constexpr unsigned int MOST_FACTOR = 65536;
-constexpr unsigned int MOST_CASCADE_FACTOR = 32768;
 constexpr unsigned int DEFAULT_SIZE = 256;
 // Windows of the image: no wider than this when they need not be, and no larger than so many bytes.
 constexpr std::uint64_t WINDOW_WIDTH = 4096;
@@ -51,7 +54,7 @@ struct Level
     PixelBounds moBounds;
     std::unique_ptr<IRasterWriter> mpoWriter;
     std::unique_ptr<IRasterIO> mpoMaskIO;
-    std::unique_ptr<detail::LevelTarget> mpoTarget;
+    std::unique_ptr<LevelTarget> mpoTarget;
 };
 
 class OverviewBuilder
@@ -68,10 +71,9 @@ private:
     bool PrepareMask(unsigned int nFactor);
     PixelBounds GetChanged(unsigned int nFactor) const;
     void Remove(unsigned int nFactor) const;
-    std::unique_ptr<detail::LevelTarget> MakeTarget(Level& oLevel);
+    std::unique_ptr<LevelTarget> MakeTarget(Level& oLevel);
     void MakeReducers();
     void AddBounds(const PixelBounds& oPart);
-    bool IsInCascade(unsigned int nFactor) const;
     bool ReadBand(unsigned int nTop, unsigned int nBottom);
     void ReadWindow(const PixelBounds& oBounds);
 
@@ -82,12 +84,12 @@ private:
     IDataset* mpoDataset = nullptr; // borrowed; null when the writer does not show one
     detail::SampleValidity moValidity;
     SourceForm moForm;
-    std::unique_ptr<detail::IValueFinisher> mpoFinisher;
+    std::unique_ptr<IValueFinisher> mpoFinisher;
     std::unique_ptr<IOverviewWriterAccessor> mpoAccessor;
     unsigned int mnMask = 0; // the bitmap that gets levels, or 0
     std::unique_ptr<IOverviewManager> mpoMaskManager;
     std::vector<Level> moLevels;
-    std::vector<std::unique_ptr<detail::ILevelReducer>> moReducers;
+    std::vector<std::unique_ptr<ILevelReducer>> moReducers;
     PixelBounds moBounds; // of the pixels that are needed
     unsigned int mnWindowWidth = 0;
     std::uint64_t mnDone = 0;
@@ -99,7 +101,9 @@ OverviewBuilder::OverviewBuilder(IRasterWriter& oWriter, Resampling eMethod, con
     : moWriter(oWriter), meMethod(eMethod), moOptions(oOptions), moPlace(oPlace),
       moValidity(oWriter, oOptions), moForm{oWriter.GetWidth(), oWriter.GetHeight(), oWriter.GetChansCount(),
                                             oWriter.GetDataType(), moValidity.IsNeeded()},
-      mpoFinisher(detail::MakeValueFinisher(oWriter.GetAuxiliaryData(), moForm, oOptions.mbNaNIsNoData)),
+      mpoFinisher(moForm.mbValidity
+                      ? krv::gobs::MakeValueFinisher(moForm.moType, moValidity.GetNoData(), oOptions.mbNaNIsNoData)
+                      : nullptr),
       mpoAccessor(oWriter.GetOverviewWriterAccessor())
 {
     if (const auto* const poAccess = dynamic_cast<const IDatasetAccess*>(&oWriter))
@@ -194,7 +198,7 @@ PixelBounds OverviewBuilder::GetChanged(unsigned int nFactor) const
     const OverviewOptions::Rectangle& oPart = *moOptions.moChanged;
     if (oPart.mnX >= moForm.mnWidth || oPart.mnY >= moForm.mnHeight || oPart.mnWidth == 0 || oPart.mnHeight == 0)
         return {};
-    const unsigned int nRadius = detail::GetKernelRadius(meMethod);
+    const unsigned int nRadius = krv::gobs::GetKernelRadius(meMethod);
     const auto First = [=](unsigned int nAt)
     {
         return nAt / nFactor - std::min(nAt / nFactor, nRadius);
@@ -208,12 +212,12 @@ PixelBounds OverviewBuilder::GetChanged(unsigned int nFactor) const
             End(oPart.mnY, oPart.mnHeight, moForm.mnHeight, nHeight)};
 }
 
-std::unique_ptr<detail::LevelTarget> OverviewBuilder::MakeTarget(Level& oLevel)
+std::unique_ptr<LevelTarget> OverviewBuilder::MakeTarget(Level& oLevel)
 {
     IRasterWriter& oWriter = *oLevel.mpoWriter;
-    auto oTarget = std::make_unique<detail::LevelTarget>(
-        detail::TileGatherer(oLevel.moBounds, oWriter.GetTileWidth(), oWriter.GetTileHeight(), moForm.mnChannels,
-                             moForm.moType, [&oWriter](const Raster& oTile) { oWriter.WriteRaster(&oTile); }),
+    auto oTarget = std::make_unique<LevelTarget>(
+        TileGatherer(oLevel.moBounds, oWriter.GetTileWidth(), oWriter.GetTileHeight(), moForm.mnChannels, moForm.moType,
+                     [&oWriter](const Raster& oTile) { oWriter.WriteRaster(&oTile); }),
         moForm, mpoFinisher.get());
     if (mnMask == 0)
         return oTarget;
@@ -224,15 +228,9 @@ std::unique_ptr<detail::LevelTarget> OverviewBuilder::MakeTarget(Level& oLevel)
         oIO.WriteWindow(static_cast<unsigned int>(oTile.GetX()), static_cast<unsigned int>(oTile.GetY()),
                         oTile.GetWidth(), oTile.GetHeight(), const_cast<unsigned char*>(oTile.GetBuffer()));
     };
-    oTarget->SetMask(std::make_unique<detail::TileGatherer>(oLevel.moBounds, oIO.GetTileWidth(), oIO.GetTileHeight(), 1,
-                                                            krv::gobs::eDT_8U, Store));
+    oTarget->SetMask(std::make_unique<TileGatherer>(oLevel.moBounds, oIO.GetTileWidth(), oIO.GetTileHeight(), 1,
+                                                    krv::gobs::eDT_8U, Store));
     return oTarget;
-}
-
-bool OverviewBuilder::IsInCascade(unsigned int nFactor) const
-{
-    return meMethod == Resampling::eAverage && std::has_single_bit(nFactor) && nFactor <= MOST_CASCADE_FACTOR &&
-           !(moForm.moType.IsComplex() && moOptions.mbPower);
 }
 
 void OverviewBuilder::AddBounds(const PixelBounds& oPart)
@@ -246,6 +244,7 @@ void OverviewBuilder::AddBounds(const PixelBounds& oPart)
 // A cascade takes windows that begin at multiples of its largest factor, everything else whole rows.
 void OverviewBuilder::MakeReducers()
 {
+    const ReductionRule oRule{meMethod, moOptions.mbHalfValid, moOptions.mbPower};
     std::vector<LevelTask> oCascade;
     unsigned int nUnit = 1;
     for (const Level& oLevel : moLevels)
@@ -253,16 +252,14 @@ void OverviewBuilder::MakeReducers()
         const LevelTask oTask{oLevel.mnFactor, oLevel.moBounds, oLevel.mpoTarget.get()};
         if (oTask.moBounds.IsEmpty())
             continue;
-        AddBounds(detail::GetSourceBounds(moForm, oTask, meMethod));
-        if (IsInCascade(oTask.mnFactor))
+        AddBounds(krv::gobs::GetSourceBounds(moForm, oTask, meMethod));
+        if (krv::gobs::IsInCascade(moForm, oRule, oTask.mnFactor))
         {
             oCascade.push_back(oTask);
             nUnit = std::max(nUnit, oTask.mnFactor);
         }
-        else if (detail::GetKernelRadius(meMethod) != 0)
-            moReducers.push_back(detail::MakeKernelReducer(moForm, oTask, meMethod));
         else
-            moReducers.push_back(detail::MakeBoxReducer(moForm, oTask, meMethod, moOptions));
+            moReducers.push_back(krv::gobs::MakeLevelReducer(moForm, oTask, oRule));
     }
     const auto RoundUp = [nUnit](unsigned int nAt, unsigned int nSize)
     {
@@ -277,7 +274,7 @@ void OverviewBuilder::MakeReducers()
     if (moReducers.empty() && nAligned <= WINDOW_WIDTH)
         mnWindowWidth = static_cast<unsigned int>(nAligned);
     if (!oCascade.empty())
-        moReducers.push_back(detail::MakeAverageCascade(moForm, oCascade, moBounds, moOptions.mbHalfValid));
+        moReducers.push_back(krv::gobs::MakeAverageCascade(moForm, oCascade, moBounds, moOptions.mbHalfValid));
 }
 
 void OverviewBuilder::ReadWindow(const PixelBounds& oBounds)
@@ -363,23 +360,6 @@ std::vector<unsigned int> CheckFactors(const std::vector<unsigned int>& oLevels,
 }
 
 } // namespace
-
-Resampling ParseResampling(const std::string& name)
-{
-    std::string upper = name;
-    for (char& nCharacter : upper)
-        nCharacter = static_cast<char>(std::toupper(static_cast<unsigned char>(nCharacter)));
-    const auto* const pFound = std::find(std::begin(NAMES), std::end(NAMES), upper);
-    if (pFound == std::end(NAMES))
-        throw krv::ParameterException("The resampling method " + name + " is not known",
-                                      krv::ParameterException::eInvalidValue, "name");
-    return static_cast<Resampling>(pFound - std::begin(NAMES));
-}
-
-std::string GetResamplingName(Resampling eMethod)
-{
-    return NAMES[static_cast<int>(eMethod)];
-}
 
 std::vector<unsigned int> GetDefaultLevels(unsigned int nWidth, unsigned int nHeight)
 {
