@@ -1,6 +1,7 @@
 #include "tests/support/thrown.h"
 #include "toolkit/ogc/cs/coordinatetransformation.h"
 #include "toolkit/ogc/cs/crsfactory.h"
+#include "toolkit/ogc/cs/crsparts.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 
 #include <gmock/gmock.h>
@@ -237,6 +238,53 @@ TEST(EPSGParts, AreFoundOrNamed)
     EXPECT_TRUE(FindEPSGUnit(9105).isAngular);
     EXPECT_NEAR(FindEPSGUnit(9105).factor, M_PI / 200.0, 1e-15);
     EXPECT_THROW(FindEPSGUnit(1), krv::DataException);
+}
+
+TEST(CRSParts, WhatWasTakenApartIsTheSameSystemWhenPutTogether)
+{
+    for (const int nCode : {32632, 2046, 3395, 3388, 3857, 6808,  2056, 3812,  27563, 3035,
+                            6933,  3083, 3295, 5041, 3031, 28992, 4390, 29101, 27200, 32064})
+    {
+        const auto poCRS = CreateCRSFromEPSG(nCode);
+        const ProjectedParts oParts = DescribeCRS(*poCRS).horizontal;
+        ASSERT_NE(oParts.method, nullptr) << nCode << poCRS->GetWKT();
+        const auto poAgain = CreateProjectedCRS(oParts);
+        EXPECT_TRUE(poAgain->IsEquivalent(*poCRS)) << nCode << poAgain->GetWKT();
+    }
+    GeodeticParts oBase = DescribeCRS(*CreateCRSFromEPSG(27700)).horizontal.base;
+    EXPECT_EQ(oBase.code, 4277);
+    oBase.code = oBase.datum.code = 0;
+    oBase.shift = {446, -125, 542};
+    const auto poBound = CreateGeographicCRS(oBase);
+    EXPECT_TRUE(poBound->IsGeographic());
+    EXPECT_EQ(poBound->GetEllipsoidName(), "Airy 1830");
+    EXPECT_EQ(DescribeCRS(*poBound).horizontal.base.shift, oBase.shift);
+    VerticalParts oHeights;
+    oHeights.code = 5701;
+    const auto poBoth = CreateCompoundCRS(*CreateCRSFromEPSG(27700), *CreateVerticalCRS(oHeights));
+    EXPECT_EQ(DescribeCRS(*poBoth).verticalCode, 5701);
+    EXPECT_TRUE(poBoth->IsEquivalent(*CreateCRSFromEPSG(7405)));
+}
+
+TEST(CRSParts, ImpossibleValuesAreNamed)
+{
+    const auto Trouble = [](const ProjectedParts& oParts)
+    {
+        return krv::test::Error([&] { CreateProjectedCRS(oParts); });
+    };
+    ProjectedParts oParts;
+    EXPECT_THAT(Trouble(oParts), HasSubstr("the ellipsoid has no possible size"));
+    oParts.base.code = 4326;
+    EXPECT_THAT(Trouble(oParts), HasSubstr("the projection has no method"));
+    oParts.method = FindProjectionMethod("Transverse Mercator");
+    EXPECT_THAT(Trouble(oParts), HasSubstr("the projection has another number of parameters"));
+    oParts.values = {0, 9, 1, NAN, 0};
+    EXPECT_THAT(Trouble(oParts), HasSubstr("the parameter \"False easting\" is not finite"));
+    oParts.length.size = -1;
+    EXPECT_THAT(Trouble(oParts), HasSubstr("a unit has no possible size"));
+    oParts.base.angle.code = 9001;
+    EXPECT_THAT(Trouble(oParts), HasSubstr("the unit metre is no unit of angle"));
+    EXPECT_EQ(FindProjectionMethod("Nobody's"), nullptr);
 }
 
 TEST(CoordinateTransformation, UsesEastingFirstWhateverTheAuthoritySays)

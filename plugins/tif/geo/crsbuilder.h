@@ -1,9 +1,9 @@
 #pragma once
 
-#include "plugins/tif/geo/geokeydirectory.h"
-#include "plugins/tif/geo/projectionrules.h"
+#include "plugins/tif/geo/geokeylist.h"
 #include "toolkit/exceptions/place.h"
 #include "toolkit/ogc/cs/crsfactory.h"
+#include "toolkit/ogc/cs/crsparts.h"
 
 #include <memory>
 #include <optional>
@@ -21,7 +21,7 @@ class CRSBuilder
 {
 public:
     // The keys are borrowed.
-    CRSBuilder(const GeoKeyDirectory& oKeys, const krv::Place& oPlace);
+    CRSBuilder(const GeoKeyList& oKeys, const krv::Place& oPlace);
 
     // Null when the keys name no system, and when they contradict each other.
     std::unique_ptr<krv::ogc::cs::ICRS> Build() const;
@@ -31,57 +31,39 @@ public:
 
 private:
     using CRS = std::unique_ptr<krv::ogc::cs::ICRS>;
-    struct Units
-    {
-        std::string angle;
-        std::string azimuth;
-        std::string length;
-    };
 
     // A definition in a citation: its system, null where it is not understood.
     struct Definition
     {
-        geokey_t eKey;
+        std::uint16_t key;
         std::string text;
         CRS system;
         std::string cause; // why it is not understood
     };
 
-    int FindModel() const;
     int FindStatedModel() const;
-    CRS BuildHorizontal() const;
     void ReadDefinition();
     bool IsBaseDefinition() const;
     CRS BuildFromText() const;
+    CRS BuildFromKeys() const;
+    CRS BuildProjected() const;
     std::string CompareUnits() const;
     std::optional<krv::ogc::cs::EPSGUnit> FindMapUnit() const;
-    CRS BuildProjected() const;
-    CRS BuildProjectedFromParts() const;
-    CRS BuildGeographic() const;
-    CRS BuildGeocentric() const;
-    CRS Shifted(CRS poSystem) const;
-    CRS WithHeights(CRS poSystem) const;
 
-    std::string Conversion() const;
-    Units FindUnits() const;
-    std::string Parameter(const ParameterRule& oRule, const Units& oUnits) const;
-    double ParameterValue(const ParameterRule& oRule) const;
-    bool UsesSecondVariant(int nMethod) const;
-    std::string BaseSystem() const;
-    std::string Datum() const;
-    std::string Ellipsoid() const;
-    std::string PrimeMeridian() const;
-    std::string Heights() const;
-    std::string HeightDatum() const;
-    std::string AngleUnit() const;
-    std::string LengthUnit() const;
-    std::string Unit(geokey_t eCode, geokey_t eSize, bool bAngle) const;
-    std::string NamedPart(geokey_t eCitation, const std::string& part) const;
+    krv::ogc::cs::ProjectedParts Projected() const;
+    krv::ogc::cs::GeodeticParts Base() const;
+    krv::ogc::cs::EllipsoidParts Ellipsoid() const;
+    std::optional<krv::ogc::cs::VerticalParts> Heights() const;
+    krv::ogc::cs::UnitParts Unit(std::uint16_t nCodeKey, std::uint16_t nSizeKey) const;
+    krv::ogc::cs::UnitParts AngleUnit() const;
+    double ParameterValue(std::uint16_t nMethod, int nParameter) const;
+    bool UsesSecondVariant(std::uint16_t nMethod) const;
+    std::string NamedPart(std::uint16_t nCitation, const std::string& part) const;
     std::string ProjectedName() const;
     bool IsPseudoMercator() const;
     [[noreturn]] void Fail(const std::string& cause) const;
 
-    const GeoKeyDirectory& moKeys;
+    const GeoKeyList& moKeys;
     krv::Place moPlace;
     std::optional<Definition> moDefinition;
 };

@@ -9,6 +9,8 @@
 #include <variant>
 #include <vector>
 
+#include <tiffio.h>
+
 namespace krv::plugins::tif
 {
 
@@ -18,18 +20,34 @@ class GeoKeyList
 public:
     using Value = std::variant<std::uint16_t, std::vector<double>, std::string>;
 
-    // The keys of the tags; what is damaged in them is left out.
+    // The keys of a page. What is damaged in them is left out, and the first of it told in pDamage; texts that are not
+    // there, and keys whose values stand in unknown places, are no damage.
     static GeoKeyList From(const TagList& oTags);
+    static GeoKeyList From(TIFF* poTiff, std::string* pDamage = nullptr);
 
     void Set(std::uint16_t nKey, Value oValue) { moKeys[nKey] = std::move(oValue); }
     void Remove(std::uint16_t nKey) { moKeys.erase(nKey); }
-    std::uint16_t GetCode(std::uint16_t nKey, std::uint16_t nDefault) const;
     bool IsEmpty() const { return moKeys.empty(); }
+
+    // The value of a key that holds a code; the default when it is absent.
+    std::uint16_t GetCode(std::uint16_t nKey, std::uint16_t nDefault = 0) const;
+    // A code that stands for something: 0 when it is absent or "user-defined".
+    std::uint16_t FindCode(std::uint16_t nKey) const;
+    // The values of a key that holds numbers, or the code of one that holds a code; none when it is absent.
+    std::vector<double> GetNumbers(std::uint16_t nKey) const;
+    std::optional<double> GetNumber(std::uint16_t nKey) const;
+    // The text of a key as UTF-8, without blanks and separators at its ends; "" when it is absent.
+    std::string GetText(std::uint16_t nKey) const;
 
     // Replaces the three tags of the keys; removes them when there are no keys.
     void Store(TagList& oTags) const;
 
 private:
+    static GeoKeyList Parse(const std::vector<std::uint16_t>& oShorts, const std::vector<double>& oDoubles,
+                            const std::string& texts, std::string* pDamage);
+    template <class Kind>
+    const Kind* Find(std::uint16_t nKey) const;
+
     std::map<std::uint16_t, Value> moKeys;
 };
 

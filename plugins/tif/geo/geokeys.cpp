@@ -1,13 +1,16 @@
 #include "plugins/tif/geo/geokeys.h"
 
 #include "plugins/tif/geo/crsbuilder.h"
-#include "plugins/tif/geo/geokeydirectory.h"
+#include "plugins/tif/geo/geokeylist.h"
+#include "plugins/tif/reading/tiffvalues.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <cmath>
 #include <cstddef>
 #include <string>
 
+#include <geotiff.h>
+#include <geovalues.h>
 #include <xtiffio.h>
 
 namespace krv::plugins::tif
@@ -65,6 +68,11 @@ void RegisterGeoTags()
     static_cast<void>(bDone);
 }
 
+bool IsPixelPoint(TIFF* poFile)
+{
+    return GeoKeyList::From(poFile).GetCode(GTRasterTypeGeoKey) == RasterPixelIsPoint;
+}
+
 bool ReadGeocoding(TIFF* poFile, GeocodingInfo& oInfo)
 {
     GeocodingInfo oFound;
@@ -97,10 +105,11 @@ std::unique_ptr<krv::ogc::cs::ICRS> ReadCRS(TIFF* poFile, std::string* pTrouble,
 {
     try
     {
-        const std::unique_ptr<GeoKeyDirectory> poKeys = GeoKeyDirectory::Read(poFile);
-        if (!poKeys)
-            return nullptr;
-        const CRSBuilder oBuilder(*poKeys, oPlace);
+        std::string damage;
+        const GeoKeyList oKeys = GeoKeyList::From(poFile, &damage);
+        if (!damage.empty())
+            throw krv::DataException("The geographic keys are damaged: " + damage, oPlace);
+        const CRSBuilder oBuilder(oKeys, oPlace);
         const std::string contradiction = oBuilder.FindContradiction();
         if (pTrouble != nullptr && !contradiction.empty())
             *pTrouble = "the geographic keys contradict each other, and no reference system is taken from them: " +

@@ -20,6 +20,9 @@ namespace krv::plugins::tif
 // often and from any thread. The functions below work without it too, but libtiff then warns of unknown tags.
 void RegisterGeoTags();
 
+// Whether the file says that raster positions are pixel centres. False when it says nothing, or nothing sensible.
+bool IsPixelPoint(TIFF* poFile);
+
 // A raster position and the map position that belongs to it. Raster coordinates are continuous, (0, 0) being the outer
 // corner of the first pixel, whatever the file's own convention is.
 struct TiePoint

@@ -1,14 +1,13 @@
 #include "plugins/tif/reading/metadata.h"
 
-#include "plugins/tif/geo/geokeydirectory.h"
 #include "plugins/tif/geo/geokeys.h"
+#include "plugins/tif/reading/tiffvalues.h"
+#include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 #include "toolkit/xml/xmltree.h"
 
-#include <array>
 #include <charconv>
-#include <cstring>
 #include <map>
 #include <string_view>
 #include <utility>
@@ -147,12 +146,8 @@ std::optional<unsigned int> ItemChannel(const krv::xml::Element& oItem, unsigned
     const std::string* pSample = oItem.FindAttribute("sample");
     if (pSample == nullptr)
         return 0;
-    unsigned int nSample = 0;
-    const char* pEnd = pSample->data() + pSample->size();
-    const auto oResult = std::from_chars(pSample->data(), pEnd, nSample);
-    if (oResult.ec != std::errc() || oResult.ptr != pEnd || nSample >= nChannels)
-        return std::nullopt;
-    return nSample + 1;
+    const std::optional<unsigned int> oSample = ParseNumber<unsigned int>(*pSample);
+    return oSample && *oSample < nChannels ? std::optional(*oSample + 1) : std::nullopt;
 }
 
 std::string ItemKey(const krv::xml::Element& oItem)
@@ -235,13 +230,6 @@ void ReadItems(TIFF* poTiff, AuxiliaryData& oData, std::string* pTrouble)
 
 } // namespace
 
-std::string NumberText(double nValue)
-{
-    std::array<char, 32> aText;
-    const auto oResult = std::to_chars(aText.data(), aText.data() + aText.size(), nValue);
-    return std::string(aText.data(), oResult.ptr);
-}
-
 bool MetadataKey::operator<(const MetadataKey& oOther) const
 {
     if (mnChannel != oOther.mnChannel || mbDescription != oOther.mbDescription)
@@ -282,28 +270,6 @@ std::string WhyNoItems(const std::string& text)
     {
         return oException.what();
     }
-}
-
-std::string ReadText(TIFF* poTiff, std::uint32_t nTag)
-{
-    const TIFFField* poField = TIFFFindField(poTiff, nTag, TIFF_ANY);
-    if (poField == nullptr)
-        return {};
-    // A number: for a tag that libtiff does not know it is what the file says, any 16 bits.
-    const int nType = static_cast<int>(TIFFFieldDataType(poField));
-    if (nType != TIFF_ASCII && nType != TIFF_BYTE && nType != TIFF_UNDEFINED)
-        return {};
-    const char* pText = nullptr;
-    if (TIFFFieldPassCount(poField) == 0)
-        return TIFFGetField(poTiff, nTag, &pText) == 1 && pText != nullptr ? std::string(pText) : std::string();
-    std::uint32_t nCount = 0;
-    std::uint16_t nShortCount = 0;
-    const bool bLong = TIFFFieldReadCount(poField) == TIFF_VARIABLE2;
-    const int nFound =
-        bLong ? TIFFGetField(poTiff, nTag, &nCount, &pText) : TIFFGetField(poTiff, nTag, &nShortCount, &pText);
-    if (nFound != 1 || pText == nullptr)
-        return {};
-    return std::string(pText, strnlen(pText, bLong ? nCount : nShortCount));
 }
 
 AuxiliaryData ReadMetadata(Page& oPage, std::string* pTrouble)

@@ -46,10 +46,4 @@ std::optional<MetadataKey> FindItemKey(const krv::xml::Element& oItem, unsigned 
 // Why no items can be read from a text of tag 42112; empty when they can.
 std::string WhyNoItems(const std::string& text);
 
-// The shortest text that reads back as the same number.
-std::string NumberText(double nValue);
-
-// A text of a tag, up to its first NUL; empty when it is absent.
-std::string ReadText(TIFF* poTiff, std::uint32_t nTag);
-
 } // namespace krv::plugins::tif

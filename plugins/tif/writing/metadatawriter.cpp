@@ -1,6 +1,8 @@
 #include "plugins/tif/writing/metadatawriter.h"
 
+#include "plugins/tif/reading/tiffvalues.h"
 #include "plugins/tif/writing/metadataitems.h"
+#include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>

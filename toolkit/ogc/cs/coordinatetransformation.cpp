@@ -1,5 +1,7 @@
 #include "toolkit/ogc/cs/coordinatetransformation.h"
 
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/ogc/cs/crsfactory.h"
 #include "toolkit/ogc/cs/detail/projcrs.h"
 
 #include <cmath>
@@ -74,6 +76,27 @@ bool CoordinateTransformation::Transform(double& nX, double& nY) const
 bool CoordinateTransformation::TransformBack(double& nX, double& nY) const
 {
     return TransformBack(1, &nX, &nY) == 1;
+}
+
+bool CanBeComputed(const ICRS& oCRS)
+{
+    constexpr int EPSG_WGS84 = 4326;
+    double nX = 0.0;
+    double nY = 0.0;
+    for (const ProjectionParameter& oParameter : oCRS.GetProjectionParameters())
+        if (oParameter.name.ends_with("asting"))
+            nX = oParameter.value;
+        else if (oParameter.name.ends_with("orthing"))
+            nY = oParameter.value;
+    try
+    {
+        return CoordinateTransformation(oCRS, *CreateCRSFromEPSG(EPSG_WGS84)).Transform(nX, nY) &&
+               std::abs(nX) <= 360.0 && std::abs(nY) <= 90.0;
+    }
+    catch (const krv::DataException&)
+    {
+        return false;
+    }
 }
 
 } // namespace krv::ogc::cs

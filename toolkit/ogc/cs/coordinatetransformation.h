@@ -38,4 +38,8 @@ private:
     std::unique_ptr<Parts> mpoParts;
 };
 
+// Whether positions of a system can be brought to longitude and latitude. Definitions of projections that nobody knows
+// are taken as they stand; nothing can be computed by them, not even where the false origin lies.
+KRV_TOOLKIT_API bool CanBeComputed(const ICRS& oCRS);
+
 } // namespace krv::ogc::cs

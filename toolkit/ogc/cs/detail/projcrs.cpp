@@ -1,8 +1,9 @@
 #include "toolkit/ogc/cs/detail/projcrs.h"
 
+#include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 
-#include <charconv>
+#include <optional>
 #include <string_view>
 #include <utility>
 
@@ -25,14 +26,20 @@ int FindEPSGCode(const PJ* poObject)
 {
     for (int nAt = 0; proj_get_id_auth_name(poObject, nAt) != nullptr; ++nAt)
     {
-        const std::string code = Text(proj_get_id_code(poObject, nAt));
-        int nCode = 0;
-        const auto oResult = std::from_chars(code.data(), code.data() + code.size(), nCode);
-        const bool bNumber = oResult.ec == std::errc() && oResult.ptr == code.data() + code.size();
-        if (bNumber && std::string_view(proj_get_id_auth_name(poObject, nAt)) == "EPSG")
-            return nCode;
+        const std::optional<int> oCode = ParseNumber<int>(Text(proj_get_id_code(poObject, nAt)));
+        if (oCode && std::string_view(proj_get_id_auth_name(poObject, nAt)) == "EPSG")
+            return *oCode;
     }
     return 0;
+}
+
+// Without what conversion between units left in the last digits.
+double WithoutNoise(double nValue)
+{
+    constexpr int DIGITS = 15;
+    char aText[32];
+    const char* const pEnd = std::to_chars(aText, aText + sizeof aText, nValue, std::chars_format::general, DIGITS).ptr;
+    return ParseNumber<double>(std::string_view(aText, pEnd)).value_or(nValue);
 }
 
 } // namespace
@@ -106,9 +113,7 @@ bool ProjCRS::IsProjected() const
 bool ProjCRS::HasVertical() const
 {
     PJ_CONTEXT* poContext = mpoContext->Get();
-    ProjObject poObject = Share(mpoObject.get());
-    while (poObject && proj_get_type(poObject.get()) == PJ_TYPE_BOUND_CRS)
-        poObject.reset(proj_get_source_crs(poContext, poObject.get()));
+    const ProjObject poObject = Unbound();
     const PJ_TYPE eType = proj_get_type(poObject.get());
     if (eType == PJ_TYPE_COMPOUND_CRS || eType == PJ_TYPE_VERTICAL_CRS)
         return true;
@@ -186,6 +191,54 @@ std::vector<ProjectionParameter> ProjCRS::GetProjectionParameters() const
 ProjObject ProjCRS::Share(const PJ* poObject) const
 {
     return ProjObject(proj_clone(mpoContext->Get(), poObject));
+}
+
+int ProjCRS::GetVerticalEPSG() const
+{
+    ProjObject poObject = Unbound();
+    if (proj_get_type(poObject.get()) == PJ_TYPE_COMPOUND_CRS && FindEPSGCode(poObject.get()) == 0)
+        poObject.reset(proj_crs_get_sub_crs(mpoContext->Get(), poObject.get(), 1));
+    return proj_get_type(poObject.get()) == PJ_TYPE_VERTICAL_CRS ? FindEPSGCode(poObject.get()) : 0;
+}
+
+GeodeticParts ProjCRS::GetBase() const
+{
+    GeodeticParts oParts;
+    const ProjObject poBase(proj_crs_get_geodetic_crs(mpoContext->Get(), Horizontal().get()));
+    if (!poBase)
+        return oParts;
+    const ProjObject poDatum(proj_crs_get_datum(mpoContext->Get(), poBase.get()));
+    oParts.code = FindEPSGCode(poBase.get());
+    oParts.name = Text(proj_get_name(poBase.get()));
+    oParts.datum.code = poDatum ? FindEPSGCode(poDatum.get()) : 0;
+    oParts.shift = Shift();
+    return oParts;
+}
+
+ProjObject ProjCRS::Unbound() const
+{
+    ProjObject poObject = Share(mpoObject.get());
+    while (poObject && proj_get_type(poObject.get()) == PJ_TYPE_BOUND_CRS)
+        poObject.reset(proj_get_source_crs(mpoContext->Get(), poObject.get()));
+    return poObject;
+}
+
+// That of a bound system to WGS 84; three numbers where the method has no more.
+std::vector<double> ProjCRS::Shift() const
+{
+    PJ_CONTEXT* poContext = mpoContext->Get();
+    const bool bBound = proj_get_type(mpoObject.get()) == PJ_TYPE_BOUND_CRS;
+    const ProjObject poShift(bBound ? proj_crs_get_coordoperation(poContext, mpoObject.get()) : nullptr);
+    std::vector<double> oShift(7);
+    if (!poShift || proj_coordoperation_get_towgs84_values(poContext, poShift.get(), oShift.data(), 7, 0) == 0)
+        return {};
+    const char* pMethod = nullptr;
+    proj_coordoperation_get_method_info(poContext, poShift.get(), &pMethod, nullptr, nullptr);
+    if (Text(pMethod).starts_with("Geocentric translations"))
+        oShift.resize(3);
+    for (double& nValue : oShift)
+        nValue = WithoutNoise(nValue);
+    return oShift;
 }
 
 // The part that places pixels: below bound and compound systems.

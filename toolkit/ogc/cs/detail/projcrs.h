@@ -1,5 +1,6 @@
 #pragma once
 
+#include "toolkit/ogc/cs/crsparts.h"
 #include "toolkit/ogc/cs/detail/projcontext.h"
 #include "toolkit/ogc/cs/icrs.h"
 
@@ -38,6 +39,11 @@ public:
 
     const PJ* GetObject() const { return mpoObject.get(); }
 
+    // Of the heights; 0 when there are none or none with a code, and when the whole has one that says them.
+    int GetVerticalEPSG() const;
+    // The geographic system below: codes of it and of its datum, name and shift.
+    GeodeticParts GetBase() const;
+
 private:
     struct Unit
     {
@@ -52,7 +58,9 @@ private:
     };
 
     ProjObject Share(const PJ* poObject) const;
+    ProjObject Unbound() const;
     ProjObject Horizontal() const;
+    std::vector<double> Shift() const;
     ProjObject Conversion() const;
     Unit HorizontalUnit() const;
     Ellipsoid FindEllipsoid() const;
