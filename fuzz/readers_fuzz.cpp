@@ -1,5 +1,5 @@
-// Readers of any channels, types, tiles and margins over images that are known pixel by pixel: made up, in DEMO files
-// and in TIFF files of every layout. Levels and readers around readers are read likewise.
+// Readers of any channels, types, tiles and margins over images that are known pixel by pixel, made up and in DEMO
+// files. Levels and readers around readers are read likewise.
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/defaultreader.h"
@@ -14,7 +14,6 @@
 #include "tests/support/demofile.h"
 #include "tests/support/recipe.h"
 #include "tests/support/syntheticdataset.h"
-#include "tests/support/tiffwriter.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 #include "tools/conformance/referenceimage.h"
@@ -40,44 +39,6 @@ NativeDataTypeCode ChooseType(Choices& oChoices)
     return static_cast<NativeDataTypeCode>(oChoices.Below(15));
 }
 
-std::uint16_t SampleFormat(const DataType& oType)
-{
-    if (oType.IsComplex())
-        return oType.IsReal() ? SAMPLEFORMAT_COMPLEXIEEEFP : SAMPLEFORMAT_COMPLEXINT;
-    if (oType.IsReal())
-        return SAMPLEFORMAT_IEEEFP;
-    return oType.IsSigned() ? SAMPLEFORMAT_INT : SAMPLEFORMAT_UINT;
-}
-
-// The blocks of a page; a recipe has values beyond the image too, which fill the tiles at its edges.
-void WritePage(TIFF* poFile, const krv::test::TiffForm& oForm, const DataType& oType, unsigned int nLevel)
-{
-    krv::test::SetForm(poFile, oForm);
-    if (nLevel != 1)
-    {
-        TIFFSetField(poFile, TIFFTAG_SUBFILETYPE, FILETYPE_REDUCEDIMAGE);
-        TIFFSetField(poFile, TIFFTAG_PAGENAME, ("Level " + std::to_string(nLevel)).c_str());
-    }
-    const std::uint32_t nBlockWidth = oForm.mnTileWidth != 0 ? oForm.mnTileWidth : oForm.mnWidth;
-    const std::uint32_t nAcross = (oForm.mnWidth + nBlockWidth - 1) / nBlockWidth;
-    const std::uint32_t nDown = (oForm.mnHeight + oForm.mnRows - 1) / oForm.mnRows;
-    Channels oSeeds;
-    for (unsigned int nChannel = 1; nChannel <= oForm.mnChannels; ++nChannel)
-        oSeeds.push_back(nChannel + (nLevel == 1 ? 0 : 1000 * nLevel));
-    for (std::uint32_t nBlock = 0; nBlock < nAcross * nDown * (oForm.mbSeparate ? oForm.mnChannels : 1); ++nBlock)
-    {
-        const std::uint32_t nPlace = nBlock % (nAcross * nDown), nY = nPlace / nAcross * oForm.mnRows;
-        const Channels oInBlock = oForm.mbSeparate ? Channels{oSeeds[nBlock / (nAcross * nDown)]} : oSeeds;
-        const std::uint32_t nRows = oForm.mnTileWidth != 0 ? oForm.mnRows : std::min(oForm.mnRows, oForm.mnHeight - nY);
-        const ReferenceImage oImage{
-            nAcross * nBlockWidth, nDown * oForm.mnRows, oType.GetValueBits() / 8 * oInBlock.size(),
-            krv::test::RecipeImage(nAcross * nBlockWidth, nDown * oForm.mnRows, oInBlock, oType)};
-        const std::string bytes = oImage.Window(nPlace % nAcross * nBlockWidth, nY, nBlockWidth, nRows);
-        krv::test::WriteBlock(poFile, nBlock, {bytes.begin(), bytes.end()});
-    }
-    TIFFWriteDirectory(poFile);
-}
-
 // An image of known pixels.
 class Scene
 {
@@ -88,31 +49,25 @@ public:
         moModel->mnHeight = 1 + oChoices.Below(30);
         moModel->mnTileWidth = 1 + oChoices.Below(20);
         moModel->mnTileHeight = 1 + oChoices.Below(20);
-        const unsigned int nKind = oChoices.Below(3);
-        DataType oFirst = ChooseType(oChoices);
-        if (nKind == 2 && oFirst == DataType(eDT_C16U))
-            oFirst = eDT_C16S; // TIFF has no other complex integers
+        const bool bDemo = oChoices.OneIn(2);
+        const DataType oFirst = ChooseType(oChoices);
         moModel->moTypes.assign(1 + oChoices.Below(5), oFirst);
-        if (nKind != 2 && oChoices.OneIn(2))
+        if (oChoices.OneIn(2))
             for (DataType& oType : moModel->moTypes)
                 oType = oChoices.OneIn(2) ? oFirst : DataType(ChooseType(oChoices));
-        if (nKind != 1)
-            for (const unsigned int nLevel : {2, 4})
-                if (oChoices.OneIn(2) && (nKind == 0 || std::min(moModel->mnWidth, moModel->mnHeight) >= 8))
-                    moModel->moLevels.push_back(nLevel);
+        for (const unsigned int nLevel : {2, 4})
+            if (!bDemo && oChoices.OneIn(2))
+                moModel->moLevels.push_back(nLevel);
         moModel->moAuxiliary = AuxiliaryData(static_cast<unsigned int>(moModel->moTypes.size()));
-        mbNoData = nKind == 0 && oChoices.OneIn(2);
+        mbNoData = !bDemo && oChoices.OneIn(2);
         if (mbNoData)
             moModel->moAuxiliary.SetFileMetadataValue("NO_DATA_VALUE", std::to_string(NO_DATA));
-        if (nKind == 0)
+        if (!bDemo)
             mpoDataset = std::make_unique<krv::test::SyntheticDataset>(moModel);
         else
         {
             mpoFile = std::make_unique<krv::fuzz::InputFile>(nullptr, 0);
-            if (nKind == 1)
-                krv::test::WriteDemoFile(mpoFile->GetName(), moModel->mnWidth, moModel->mnHeight, moModel->moTypes);
-            else
-                WriteTiff(oChoices);
+            krv::test::WriteDemoFile(mpoFile->GetName(), moModel->mnWidth, moModel->mnHeight, moModel->moTypes);
             mpoDataset.reset(DatasetManager::GetInstance()->Open(mpoFile->GetName(), eReadOnly));
         }
     }
@@ -148,37 +103,6 @@ public:
     }
 
 private:
-    void WriteTiff(Choices& oChoices)
-    {
-        constexpr std::uint16_t CODECS[] = {COMPRESSION_NONE, COMPRESSION_ADOBE_DEFLATE, COMPRESSION_LZW,
-                                            COMPRESSION_ZSTD, COMPRESSION_PACKBITS,      COMPRESSION_LZMA};
-        constexpr const char* MODES[] = {"wl", "wl8", "wb", "wb8"};
-        const DataType& oType = moModel->moTypes[0];
-        krv::test::TiffForm oForm{moModel->mnWidth,
-                                  moModel->mnHeight,
-                                  static_cast<std::uint16_t>(GetChannelCount()),
-                                  static_cast<std::uint16_t>(oType.GetValueBits()),
-                                  SampleFormat(oType),
-                                  oChoices.Of(CODECS)};
-        if (oForm.mnCompression != COMPRESSION_NONE && oForm.mnCompression != COMPRESSION_PACKBITS &&
-            !oType.IsComplex() && oChoices.OneIn(2))
-            oForm.mnPredictor = oType.IsReal() ? PREDICTOR_FLOATINGPOINT : PREDICTOR_HORIZONTAL;
-        oForm.mbSeparate = oChoices.OneIn(2);
-        oForm.mnTileWidth = oChoices.OneIn(2) ? 16 + 16 * oChoices.Below(2) : 0;
-        oForm.mnRows = oForm.mnTileWidth != 0 ? 16 : 1 + oChoices.Below(20);
-        // libtiff turns the bytes of complex values, and of reals under a predictor, otherwise than it reads them.
-        const bool bLittle = oType.IsComplex() || oForm.mnPredictor == PREDICTOR_FLOATINGPOINT;
-        const char* const pMode = MODES[oChoices.Below(bLittle ? 2 : 4)];
-        const krv::test::TiffFile oFile = krv::test::NewTiff(mpoFile->GetName(), pMode);
-        WritePage(oFile.get(), oForm, oType, 1);
-        for (const unsigned int nLevel : moModel->moLevels)
-        {
-            oForm.mnWidth = moModel->LevelWidth(nLevel);
-            oForm.mnHeight = moModel->LevelHeight(nLevel);
-            WritePage(oFile.get(), oForm, oType, nLevel);
-        }
-    }
-
     krv::test::ImageModelPtr moModel = std::make_shared<krv::test::ImageModel>();
     std::unique_ptr<krv::fuzz::InputFile> mpoFile;
     std::unique_ptr<IDataset> mpoDataset;

@@ -5,28 +5,62 @@
 #include "datasources/metadata/typednodata.h"
 #include "fuzz/support/exercise.h"
 #include "fuzz/support/inputfile.h"
-#include "fuzz/support/rawtiff.h"
 #include "toolkit/nspio/warning.h"
 
 #include <fuzzer/FuzzedDataProvider.h>
 
 #include <cstdlib>
+#include <map>
 
 namespace
 {
 
-using krv::fuzz::RawTiff;
-
 struct Tag
 {
     std::uint16_t mnNumber;
-    RawTiff::Type meType;
+    std::uint16_t mnType;
 };
 
-constexpr Tag TAGS[] = {{270, RawTiff::eText},     {42112, RawTiff::eText},   {42113, RawTiff::eText},
-                        {33550, RawTiff::eDouble}, {33922, RawTiff::eDouble}, {34264, RawTiff::eDouble},
-                        {34735, RawTiff::eShort},  {34736, RawTiff::eDouble}, {34737, RawTiff::eText},
-                        {50844, RawTiff::eDouble}};
+constexpr std::uint16_t TEXT = 2, SHORT = 3, LONG = 4, DOUBLE = 12;
+constexpr Tag TAGS[] = {{270, TEXT},     {42112, TEXT},  {42113, TEXT},   {33550, DOUBLE}, {33922, DOUBLE},
+                        {34264, DOUBLE}, {34735, SHORT}, {34736, DOUBLE}, {34737, TEXT},   {50844, DOUBLE}};
+
+void Append(std::string& bytes, std::uint64_t nValue, unsigned int nCount)
+{
+    for (unsigned int n = 0; n < nCount; ++n)
+        bytes += static_cast<char>(nValue >> (8 * n));
+}
+
+// A TIFF file of one 8-bit channel, 4 x 4 pixels. The tags, by number, have any contents, but whole values.
+std::string MakeFile(std::map<std::uint16_t, std::pair<std::uint16_t, std::string>> oTags)
+{
+    for (const auto& [nTag, nValue] :
+         {std::pair(256, 4), {257, 4}, {258, 8}, {259, 1}, {262, 1}, {273, 8}, {277, 1}, {278, 4}, {279, 16}})
+        oTags[static_cast<std::uint16_t>(nTag)] = {LONG,
+                                                   std::string(1, static_cast<char>(nValue)) + std::string(3, '\0')};
+    std::string file("II*\0\x18\0\0\0", 8), values;
+    file.append(16, '\x55');
+    Append(file, oTags.size(), 2);
+    const std::size_t nFree = file.size() + oTags.size() * 12 + 4;
+    for (const auto& [nTag, oTag] : oTags)
+    {
+        const std::size_t nBytes = oTag.first == TEXT ? 1 : oTag.first == SHORT ? 2 : oTag.first == LONG ? 4 : 8;
+        Append(file, nTag, 2);
+        Append(file, oTag.first, 2);
+        Append(file, oTag.second.size() / nBytes, 4);
+        std::string value = oTag.second.substr(0, oTag.second.size() / nBytes * nBytes);
+        if (value.size() > 4)
+        {
+            Append(file, nFree + values.size(), 4);
+            values += value;
+            continue;
+        }
+        value.resize(4);
+        file += value;
+    }
+    Append(file, 0, 4);
+    return file + values;
+}
 
 // What a tag was built from comes back.
 void CheckReferences(const std::string& text, unsigned int nNumber)
@@ -53,18 +87,18 @@ extern "C" int LLVMFuzzerInitialize(int*, char***)
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* poBytes, std::size_t nBytes)
 {
     FuzzedDataProvider oData(poBytes, nBytes);
-    RawTiff oTiff;
+    std::map<std::uint16_t, std::pair<std::uint16_t, std::string>> oTags;
     const auto nWanted = oData.ConsumeIntegral<std::uint16_t>();
     for (std::size_t n = 0; n < std::size(TAGS); ++n)
     {
         if ((nWanted >> n & 1U) == 0)
             continue;
         const std::string bytes = oData.ConsumeRandomLengthString();
-        oTiff.Add(TAGS[n].mnNumber, TAGS[n].meType, bytes);
+        oTags[TAGS[n].mnNumber] = {TAGS[n].mnType, bytes};
         krv::datasources::ParseNoData(bytes);
         CheckReferences(bytes, nWanted);
     }
-    const std::string file = oTiff.GetBytes();
+    const std::string file = MakeFile(oTags);
     const krv::fuzz::InputFile oFile(reinterpret_cast<const std::uint8_t*>(file.data()), file.size());
     krv::fuzz::ExerciseFile(oFile.GetName());
     return 0;

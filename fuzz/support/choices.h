@@ -37,6 +37,15 @@ public:
         return oList[Below(std::size(oList))];
     }
 
+    // Any bytes, at most so many.
+    std::string Text(std::size_t nMost)
+    {
+        std::string text(Below(nMost + 1), '\0');
+        for (char& nByte : text)
+            nByte = static_cast<char>(Below(256));
+        return text;
+    }
+
     // For bulk that need not be chosen byte by byte.
     std::mt19937 Random() { return std::mt19937(Below(65536)); }
 

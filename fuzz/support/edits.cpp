@@ -3,6 +3,8 @@
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/irasterio.h"
+#include "datasources/metadata/auxiliarydata.h"
+#include "datasources/metadata/pixelstatistics.h"
 #include "gobs/pct/pct.h"
 #include "gobs/raster/rasterinfo.h"
 #include "plugins/tif/tifbuilder.h"
@@ -12,10 +14,10 @@
 #include "toolkit/xml/xmlutil.h"
 
 #include <algorithm>
-#include <cstdio>
-#include <cstdlib>
 #include <cstring>
 #include <numeric>
+#include <stdexcept>
+#include <utility>
 
 namespace krv::fuzz
 {
@@ -28,7 +30,6 @@ using krv::datasources::IOverviewManager;
 using krv::datasources::IRasterIO;
 using krv::plugins::tif::TifDataset;
 
-constexpr std::uint64_t MAX_BYTES = 1U << 14;
 constexpr unsigned int MAX_SIDE = 4096;
 constexpr unsigned int MAX_CHANNELS = 12;
 constexpr std::size_t MAX_PAGES = 6;
@@ -36,8 +37,7 @@ constexpr unsigned int MAX_STEPS = 16;
 
 [[noreturn]] void Complain(const std::string& what)
 {
-    std::fprintf(stderr, "THE MODEL SAYS OTHERWISE: %s\n", what.c_str());
-    std::abort();
+    throw std::logic_error("the model says otherwise: " + what);
 }
 
 std::vector<unsigned int> Count(unsigned int nCount)
@@ -106,7 +106,8 @@ std::string Text(const krv::datasources::MetadataMap& oMap)
 {
     std::string text;
     for (const auto& [key, value] : oMap)
-        text += key + "=" + value + "\n";
+        if (!key.starts_with("_Overview_")) // asked for as states
+            text += key + "=" + value + "\n";
     return text;
 }
 
@@ -132,9 +133,10 @@ View Look(TifDataset& oDataset)
             oView.moLevels[nLevel] = Samples(); // its page cannot be read
         }
         for (unsigned int nChannel = 1; nChannel <= nChannels; ++nChannel)
-            oView.moStates += poLevels->IsValid(nChannel, nLevel) ? "1" : "0";
+            oView.moStates[nLevel] += poLevels->IsValid(nChannel, nLevel) ? "1" : "0";
     }
-    const AuxiliaryData oRecord = oDataset.ReadAuxiliaryData();
+    AuxiliaryData oRecord = oDataset.ReadAuxiliaryData();
+    krv::datasources::DropStatistics(oRecord); // every change of pixels does
     oView.moRecord = Text(oRecord.GetFileMetadata());
     for (unsigned int nChannel = 1; nChannel <= oRecord.GetChannelCount(); ++nChannel)
         oView.moRecord += Text(oRecord.GetChanMetadata(nChannel)) + oRecord.GetChannelDescription(nChannel) + "\n";
@@ -207,6 +209,15 @@ void Forget(Samples& oSamples)
     std::fill(oSamples.moKnown.begin(), oSamples.moKnown.end(), static_cast<unsigned char>(0));
 }
 
+// Whether any page is coded with loss.
+bool IsLossy(TifDataset& oDataset)
+{
+    std::vector<unsigned int> oLevels = std::unique_ptr<IOverviewManager>(oDataset.GetOverviewManager())->GetLevels();
+    oLevels.push_back(1);
+    return std::any_of(oLevels.begin(), oLevels.end(),
+                       [&](unsigned int nLevel) { return oDataset.GetEncodedForm(nLevel).mbLossy; });
+}
+
 // nSource: the old channel (from 1) of each new one, or 0.
 void Rearrange(Samples& oSamples, const std::vector<unsigned int>& oSources)
 {
@@ -244,12 +255,9 @@ TifPointer OpenTif(const std::string& fileName, AccessMode eMode)
     }
 }
 
-Edits::Edits(const std::string& fileName, FuzzedDataProvider& oProgram, bool bLossy)
-    : moFileName(fileName), moProgram(oProgram), mbLossy(bLossy)
-{
-}
+Edits::Edits(const std::string& fileName, Choices& oProgram) : moFileName(fileName), moProgram(oProgram) {}
 
-bool Edits::IsSmall(TifDataset& oDataset)
+bool Edits::IsSmall(TifDataset& oDataset, std::uint64_t nMostBytes)
 {
     const std::unique_ptr<krv::datasources::IChannelInfo> poInfo(oDataset.GetChannelInfo(1));
     const std::unique_ptr<IOverviewManager> poLevels(oDataset.GetOverviewManager());
@@ -258,7 +266,7 @@ bool Edits::IsSmall(TifDataset& oDataset)
            oDataset.GetBitmapList().size() <= MAX_PAGES &&
            std::uint64_t{oDataset.GetWidth()} * oDataset.GetHeight() * oDataset.GetChanCount() *
                    ValueBytes(poInfo->GetDataType()) <=
-               MAX_BYTES;
+               nMostBytes;
 }
 
 void Edits::Check(const char* pWhat, const View& oGot) const
@@ -267,8 +275,11 @@ void Edits::Check(const char* pWhat, const View& oGot) const
     Compare(what + "the image", moModel.moImage, oGot.moImage);
     Compare(what + "level", moModel.moLevels, oGot.moLevels);
     Compare(what + "bitmap", moModel.moBitmaps, oGot.moBitmaps);
-    constexpr std::pair<const char*, Part> PARTS[] = {{"states of levels", &View::moStates},
-                                                      {"record", &View::moRecord},
+    for (const auto& [nLevel, states] : oGot.moStates)
+        if (const auto oWanted = moModel.moStates.find(nLevel);
+            oWanted == moModel.moStates.end() || oWanted->second != states)
+            Complain(what + "level " + std::to_string(nLevel) + " has states " + states);
+    constexpr std::pair<const char*, Part> PARTS[] = {{"record", &View::moRecord},
                                                       {"texts of bitmaps", &View::moBitmapTexts},
                                                       {"tables", &View::moTables},
                                                       {"geography", &View::moGeography}};
@@ -298,13 +309,13 @@ bool Edits::Try(const char* pWhat, const std::function<void()>& oAction, const s
     return bDone;
 }
 
-void Edits::WritePixels(IRasterIO& oIO, Samples& oSamples, const std::vector<unsigned int>& oChannels, bool bBits)
+bool Edits::WritePixels(IRasterIO& oIO, Samples& oSamples, const std::vector<unsigned int>& oChannels, bool bBits)
 {
-    const unsigned int nX = moProgram.ConsumeIntegralInRange(0U, oSamples.mnWidth - 1);
-    const unsigned int nY = moProgram.ConsumeIntegralInRange(0U, oSamples.mnHeight - 1);
-    const unsigned int nWidth = moProgram.ConsumeIntegralInRange(1U, oSamples.mnWidth - nX);
-    const unsigned int nHeight = moProgram.ConsumeIntegralInRange(1U, oSamples.mnHeight - nY);
-    const unsigned int nSeed = moProgram.ConsumeIntegral<unsigned char>();
+    const unsigned int nX = moProgram.Below(oSamples.mnWidth);
+    const unsigned int nY = moProgram.Below(oSamples.mnHeight);
+    const unsigned int nWidth = 1 + moProgram.Below(oSamples.mnWidth - nX);
+    const unsigned int nHeight = 1 + moProgram.Below(oSamples.mnHeight - nY);
+    const unsigned int nSeed = moProgram.Below(256);
     const std::unique_ptr<krv::datasources::IChannelInfo> poInfo(mpoDataset->GetChannelInfo(1));
     const krv::gobs::DataType& oType = poInfo->GetDataType();
     const bool bWhole = poInfo->GetNativeDataType() == oType;
@@ -312,17 +323,19 @@ void Edits::WritePixels(IRasterIO& oIO, Samples& oSamples, const std::vector<uns
     std::vector<unsigned char> oBuffer(std::size_t{nWidth} * nHeight * oChannels.size() * nBytes);
     for (std::size_t nAt = 0; nAt < oBuffer.size(); ++nAt)
         oBuffer[nAt] = static_cast<unsigned char>((nAt * nSeed + nAt / 7 + nSeed) >> (nSeed % 3));
-    // Values of fewer bits than they are handed out with: such as every width holds, 0 and 1.
+    // Values that the stored samples hold where they have fewer bits.
     const std::size_t nPart = bBits ? 1 : oType.GetBits() / 8;
+    const unsigned int nKept = bBits ? 1 : poInfo->GetNativeDataType().GetBits() - (oType.IsSigned() ? 1 : 0);
     for (std::size_t nAt = 0; (bBits || !bWhole) && nAt < oBuffer.size(); nAt += nPart)
     {
-        const unsigned char nBit = oBuffer[nAt] & (oType.IsSigned() && !oType.IsReal() && !bBits ? 0 : 1);
-        const float nReal = nBit;
-        std::fill_n(oBuffer.begin() + static_cast<std::ptrdiff_t>(nAt), nPart, static_cast<unsigned char>(0));
+        std::uint64_t nValue = 0;
+        std::memcpy(&nValue, &oBuffer[nAt], nPart);
+        nValue &= (std::uint64_t{1} << nKept) - 1;
+        const float nReal = static_cast<float>(nValue % 16);
         if (oType.IsReal() && !bBits)
-            std::memcpy(&oBuffer[nAt], &nReal, std::min<std::size_t>(nPart, sizeof(nReal)));
+            std::memcpy(&oBuffer[nAt], &nReal, sizeof(nReal));
         else
-            oBuffer[nAt] = nBit;
+            std::memcpy(&oBuffer[nAt], &nValue, nPart);
     }
     // A write that fails leaves its own window undefined, no more.
     const bool bKnown = [&]
@@ -338,7 +351,7 @@ void Edits::WritePixels(IRasterIO& oIO, Samples& oSamples, const std::vector<uns
         }
     }();
     if (mbLossy)
-        return Forget(oSamples);
+        Forget(oSamples);
     for (unsigned int nRow = 0; nRow < nHeight; ++nRow)
         for (unsigned int nColumn = 0; nColumn < nWidth; ++nColumn)
             for (std::size_t nAt = 0; nAt < oChannels.size(); ++nAt)
@@ -346,35 +359,38 @@ void Edits::WritePixels(IRasterIO& oIO, Samples& oSamples, const std::vector<uns
                 const std::size_t nTo =
                     (std::size_t{nY + nRow} * oSamples.mnWidth + nX + nColumn) * oSamples.mnChannels + oChannels[nAt] -
                     1;
-                oSamples.moKnown[nTo] = bKnown;
+                oSamples.moKnown[nTo] = bKnown && !mbLossy;
                 std::memcpy(&oSamples.moBytes[nTo * nBytes],
                             &oBuffer[((std::size_t{nRow} * nWidth + nColumn) * oChannels.size() + nAt) * nBytes],
                             nBytes);
             }
+    return bKnown;
 }
 
-// The first change of the image marks its levels and drops what was counted of it.
+// A change of the image makes its levels invalid.
 void Edits::WriteWindow()
 {
     std::vector<unsigned int> oChannels = Count(moModel.moImage.mnChannels);
-    if (moProgram.ConsumeBool())
-        oChannels = {moProgram.ConsumeIntegralInRange(1U, moModel.moImage.mnChannels)};
+    if (moProgram.OneIn(2))
+        oChannels = {1 + moProgram.Below(moModel.moImage.mnChannels)};
     Try("window",
         [&]
         {
             const std::unique_ptr<IRasterIO> poIO(mpoDataset->GetRasterIO(oChannels));
-            WritePixels(*poIO, moModel.moImage, oChannels, false);
+            if (!WritePixels(*poIO, moModel.moImage, oChannels, false))
+                return void(moModel.moStates = Look(*mpoDataset).moStates); // it may have begun
+            for (auto& [nLevel, states] : moModel.moStates)
+                std::fill(states.begin(), states.end(), '0');
         },
-        {&View::moStates, &View::moRecord});
+        {});
 }
 
 void Edits::ChangeChannels()
 {
     const unsigned int nOld = moModel.moImage.mnChannels;
     std::vector<unsigned int> oSources = Count(nOld);
-    View oChanged = moModel;
-    const bool bAdd = moProgram.ConsumeBool();
-    const unsigned int nChannel = moProgram.ConsumeIntegralInRange(0U, nOld + 1);
+    const bool bAdd = moProgram.OneIn(2);
+    const unsigned int nChannel = moProgram.Below(nOld + 2);
     if (bAdd)
         oSources.resize(nOld + 1 + nChannel % 2, 0);
     else if (nChannel >= 1 && nChannel <= nOld)
@@ -382,7 +398,6 @@ void Edits::ChangeChannels()
     if (oSources.empty() || oSources.size() > MAX_CHANNELS)
         return;
     const std::unique_ptr<krv::datasources::IChannelInfo> poInfo(mpoDataset->GetChannelInfo(1));
-    const View oBefore = moModel;
     const auto Change = [&]
     {
         if (bAdd)
@@ -390,16 +405,20 @@ void Edits::ChangeChannels()
                                                             1 + nChannel % 2, poInfo->GetDataType()));
         else
             mpoDataset->DeleteChannel(nChannel);
-        for (auto& [nLevel, oLevel] : moModel.moLevels)
-            Rearrange(oLevel, oSources);
         Rearrange(moModel.moImage, oSources);
         if (mbLossy)
             Forget(moModel.moImage);
         for (auto& [nLevel, oLevel] : moModel.moLevels)
+        {
+            Rearrange(oLevel, oSources);
             if (mbLossy)
                 Forget(oLevel);
+            const std::string old = std::exchange(moModel.moStates[nLevel], "");
+            for (const unsigned int nSource : oSources)
+                moModel.moStates[nLevel] += nSource == 0 ? '0' : old[nSource - 1];
+        }
     };
-    Try(bAdd ? "channels added" : "channel deleted", Change, {&View::moStates, &View::moRecord, &View::moTables});
+    Try(bAdd ? "channels added" : "channel deleted", Change, {&View::moRecord, &View::moTables});
 }
 
 void Edits::ChangeRecord()
@@ -407,11 +426,10 @@ void Edits::ChangeRecord()
     constexpr const char* KEYS[] = {"Title", "ImageDescription", "Software", "NO_DATA_VALUE",
                                     "a:b",   "XResolution",      "RPC"};
     AuxiliaryData oRecord = mpoDataset->ReadAuxiliaryData();
-    const std::string key = moProgram.ConsumeBool() ? std::string(moProgram.PickValueInArray(KEYS))
-                                                    : "own " + moProgram.ConsumeRandomLengthString(12);
-    const std::string value = moProgram.ConsumeRandomLengthString(40);
-    const unsigned int nChannel = moProgram.ConsumeIntegralInRange(0U, oRecord.GetChannelCount());
-    const bool bDescription = moProgram.ConsumeIntegralInRange(0, 3) == 0;
+    const std::string key = moProgram.OneIn(2) ? std::string(moProgram.Of(KEYS)) : "own " + moProgram.Text(12);
+    const std::string value = moProgram.Text(40);
+    const unsigned int nChannel = moProgram.Below(oRecord.GetChannelCount() + 1);
+    const bool bDescription = moProgram.OneIn(4);
     if (nChannel == 0)
         oRecord.SetFileMetadataValue(key, value);
     else if (bDescription)
@@ -431,9 +449,9 @@ void Edits::ChangeRecord()
 void Edits::ChangeLevels()
 {
     const std::unique_ptr<IOverviewManager> poLevels(mpoDataset->GetOverviewManager());
-    const unsigned int nLevel = moProgram.ConsumeIntegralInRange(0U, 9U);
+    const unsigned int nLevel = moProgram.Below(10);
     const auto oFound = moModel.moLevels.find(nLevel);
-    switch (moProgram.ConsumeIntegralInRange(0, 3))
+    switch (moProgram.Below(4))
     {
     case 0:
         if (moModel.moLevels.size() < MAX_PAGES)
@@ -449,8 +467,9 @@ void Edits::ChangeLevels()
                     oLevel.moKnown.assign(nValues, 1);
                     if (!moModel.moLevels.emplace(nLevel, std::move(oLevel)).second)
                         Complain("a level was made twice");
+                    moModel.moStates[nLevel].assign(moModel.moImage.mnChannels, '0');
                 },
-                {&View::moStates, &View::moRecord});
+                {});
         return;
     case 1:
         Try("level deleted",
@@ -458,12 +477,19 @@ void Edits::ChangeLevels()
             {
                 poLevels->DeleteLevel(nLevel);
                 moModel.moLevels.erase(nLevel);
+                moModel.moStates.erase(nLevel);
             },
-            {&View::moStates, &View::moRecord});
+            {});
         return;
     case 2:
-        Try("level marked", [&] { poLevels->SetValid(1, nLevel, moProgram.ConsumeBool()); },
-            {&View::moStates, &View::moRecord});
+        Try("level marked",
+            [&]
+            {
+                const bool bValid = moProgram.OneIn(2);
+                poLevels->SetValid(1, nLevel, bValid);
+                moModel.moStates.at(nLevel)[0] = bValid ? '1' : '0';
+            },
+            {});
         return;
     default:
         if (oFound != moModel.moLevels.end() && oFound->second.mnWidth != 0)
@@ -480,10 +506,10 @@ void Edits::ChangeLevels()
 
 void Edits::ChangeBitmaps()
 {
-    const unsigned int nBitmap = moProgram.ConsumeIntegralInRange(1U, 7U);
+    const unsigned int nBitmap = 1 + moProgram.Below(7);
     const auto oFound = moModel.moBitmaps.find(nBitmap);
-    const std::string text = moProgram.ConsumeRandomLengthString(20);
-    switch (moProgram.ConsumeIntegralInRange(0, 4))
+    const std::string text = moProgram.Text(20);
+    switch (moProgram.Below(5))
     {
     case 0:
         if (moModel.moBitmaps.size() < MAX_PAGES)
@@ -539,9 +565,9 @@ void Edits::ChangeBitmaps()
 
 void Edits::ChangeTables()
 {
-    const int nWay = moProgram.ConsumeIntegralInRange(0, 2);
+    const unsigned int nWay = moProgram.Below(3);
     std::vector<krv::gobs::RGBTuple<std::uint16_t>> oColours(256);
-    const unsigned int nStep = moProgram.ConsumeIntegral<unsigned char>();
+    const unsigned int nStep = moProgram.Below(256);
     for (unsigned int nAt = 0; nAt < 256; ++nAt)
         oColours[nAt] = {static_cast<std::uint16_t>(nAt * 257), static_cast<std::uint16_t>(nAt * nStep), 40000};
     const krv::gobs::PCT oTable = krv::gobs::PCT::FromColours(oColours);
@@ -561,10 +587,10 @@ void Edits::ChangeTables()
 void Edits::ChangeGeography()
 {
     constexpr int SYSTEMS[] = {32632, 4326, 3857, 2263};
-    const double nUnit = moProgram.ConsumeIntegralInRange(-4, 4) / 2.0;
-    const bool bSystem = moProgram.ConsumeIntegralInRange(0, 3) == 0;
-    const krv::ogc::cs::GeocodingInfo oInfo(1000.5, nUnit, moProgram.ConsumeBool() ? 0.25 : 0, 2000, 0, -1);
-    const int nCode = moProgram.PickValueInArray(SYSTEMS);
+    const double nUnit = moProgram.Between(-4, 4) / 2.0;
+    const bool bSystem = moProgram.OneIn(4);
+    const krv::ogc::cs::GeocodingInfo oInfo(1000.5, nUnit, moProgram.OneIn(2) ? 0.25 : 0, 2000, 0, -1);
+    const int nCode = moProgram.Of(SYSTEMS);
     const bool bDone = Try(bSystem ? "reference system" : "geocoding",
                            [&]
                            {
@@ -581,7 +607,7 @@ void Edits::ChangeGeography()
 // The file says what the dataset said; without being stored, what it said when it was stored last.
 void Edits::Reopen()
 {
-    const bool bStore = moProgram.ConsumeIntegralInRange(0, 4) != 0;
+    const bool bStore = !moProgram.OneIn(5);
     try
     {
         if (bStore)
@@ -610,7 +636,7 @@ void Edits::Reopen()
 
 void Edits::Step()
 {
-    switch (moProgram.ConsumeIntegralInRange(0, 11))
+    switch (moProgram.Below(12))
     {
     case 0:
     case 1:
@@ -644,12 +670,13 @@ void Edits::Step()
 void Edits::Run(TifPointer poDataset)
 {
     mpoDataset = std::move(poDataset);
+    mbLossy = IsLossy(*mpoDataset);
     mbNamed = mpoDataset->Exists() && OpenTif(moFileName, eReadOnly) != nullptr;
     moModel = Look(*mpoDataset);
     moStored = moModel;
     if (mbNamed)
         Check("opening for update", Look(*OpenTif(moFileName, eReadOnly)));
-    for (unsigned int nStep = 0; mpoDataset && nStep < MAX_STEPS && moProgram.remaining_bytes() != 0; ++nStep)
+    for (unsigned int nStep = 0; mpoDataset && nStep < MAX_STEPS && !moProgram.IsAtEnd(); ++nStep)
         Step();
     if (mpoDataset)
         Reopen();

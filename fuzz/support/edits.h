@@ -1,8 +1,7 @@
 #pragma once
 
+#include "fuzz/support/choices.h"
 #include "plugins/tif/tifdataset.h"
-
-#include <fuzzer/FuzzedDataProvider.h>
 
 #include <functional>
 #include <map>
@@ -33,24 +32,23 @@ struct View
     Samples moImage;
     std::map<unsigned int, Samples> moLevels;
     std::map<unsigned int, Samples> moBitmaps;
-    std::string moStates; // of the levels
-    std::string moRecord; // metadata of file and channels, descriptions
+    std::map<unsigned int, std::string> moStates; // of the channels of each level, 1: valid
+    std::string moRecord;                         // metadata of file and channels, descriptions
     std::string moBitmapTexts;
     std::string moTables;
     std::string moGeography; // geocoding and reference system
 };
 
-// Changes a dataset at random beside a model of its file. Ends the program, with a text that says why, when an
+// Changes a dataset at random beside a model of its file. Throws std::logic_error, with a text that says why, when an
 // operation gives anything but what the model says, when one that throws changes something, and when the file that is
-// left says anything but the dataset did.
+// left says anything but the dataset did. Pixels that a lossy codec stores are not compared.
 class Edits
 {
 public:
-    // bLossy: pixels that are written come back as something near.
-    Edits(const std::string& fileName, FuzzedDataProvider& oProgram, bool bLossy);
+    Edits(const std::string& fileName, Choices& oProgram);
 
     // Whether the dataset is small enough to be compared all the time.
-    static bool IsSmall(krv::plugins::tif::TifDataset& oDataset);
+    static bool IsSmall(krv::plugins::tif::TifDataset& oDataset, std::uint64_t nMostBytes = 1U << 14);
 
     void Run(TifPointer poDataset);
 
@@ -62,7 +60,8 @@ private:
     bool Try(const char* pWhat, const std::function<void()>& oAction, const std::vector<Part>& oMay);
     void Check(const char* pWhat, const View& oGot) const;
     void WriteWindow();
-    void WritePixels(krv::datasources::IRasterIO& oIO, Samples& oSamples, const std::vector<unsigned int>& oChannels,
+    // Whether it was not refused.
+    bool WritePixels(krv::datasources::IRasterIO& oIO, Samples& oSamples, const std::vector<unsigned int>& oChannels,
                      bool bBits);
     void ChangeChannels();
     void ChangeRecord();
@@ -73,8 +72,8 @@ private:
     void Reopen();
 
     std::string moFileName;
-    FuzzedDataProvider& moProgram;
-    bool mbLossy;
+    Choices& moProgram;
+    bool mbLossy = false;
     TifPointer mpoDataset;
     View moModel;
     View moStored; // as of the last time that the file was written

@@ -64,28 +64,7 @@ void ExpectFilled(const std::vector<std::string>& oBefore, const Raster& oAfter,
         }
 }
 
-std::string FillLine(std::string sLine, unsigned int nMargin, eMarginBehaviour eBehaviour)
-{
-    const auto nWidth = static_cast<unsigned int>(sLine.size());
-    sLine = std::string(nMargin, '?') + sLine + std::string(nMargin, '?');
-    Raster oRaster(RasterInfo(nWidth, 1, 1, DataType(eDT_8U)), RasterContext(0, 0, nMargin, 0),
-                   reinterpret_cast<unsigned char*>(sLine.data()), false);
-    FillRasterMargins(&oRaster, eBehaviour, eRightSide | eLeftSide);
-    return sLine;
-}
-
 } // namespace
-
-TEST(FillRasterMarginsTest, WorkedLines)
-{
-    EXPECT_EQ(FillLine("1234", 3, eReplicate), "1111234444");
-    EXPECT_EQ(FillLine("1234", 3, eMirror), "3211234432");
-    EXPECT_EQ(FillLine("1234", 3, eMirror101), "4321234321");
-    EXPECT_EQ(FillLine("1234", 3, eWrap), "2341234123");
-    EXPECT_EQ(FillLine("12", 5, eMirror), "112211221122");
-    EXPECT_EQ(FillLine("7", 3, eMirror101), "7777777");
-    EXPECT_EQ(FillLine("12", 1, eConstant), std::string("\0", 1) + "12" + std::string("\0", 1));
-}
 
 TEST(FillRasterMarginsTest, EveryBehaviourSideAndPixelSizeLikeTheNaiveModel)
 {

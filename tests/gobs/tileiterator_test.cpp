@@ -8,29 +8,6 @@
 using namespace krv;
 using namespace krv::gobs;
 
-TEST(TileIteratorTest, TilesCoverTheImageOnceRowByRow)
-{
-    TileIterator oGrid(11, 7);
-    EXPECT_EQ(oGrid.GetTileRange(), 0u);
-    EXPECT_EQ(oGrid.GetTile(0), Tile(0, 0, 11, 7));
-    oGrid.SetChunkSize(4, 3);
-    ASSERT_EQ(oGrid.GetTileRange(), 8u);
-    EXPECT_EQ(oGrid.GetTile(1), Tile(4, 0, 4, 3));
-    EXPECT_EQ(oGrid.GetTile(8), Tile(8, 6, 3, 1));
-    std::vector<int> oTimes(11 * 7);
-    for (unsigned int nIndex = 0; nIndex <= oGrid.GetTileRange(); ++nIndex)
-    {
-        const Tile oTile = oGrid.GetTile(nIndex);
-        for (unsigned int nY = oTile.GetY(); nY < oTile.GetY() + oTile.GetHeight(); ++nY)
-            for (unsigned int nX = oTile.GetX(); nX < oTile.GetX() + oTile.GetWidth(); ++nX)
-            {
-                ++oTimes.at(nY * 11 + nX);
-                EXPECT_EQ(oGrid.GetTileIndex(nX, nY), nIndex);
-            }
-    }
-    EXPECT_EQ(oTimes, std::vector<int>(11 * 7, 1));
-}
-
 TEST(TileIteratorTest, OutsideTheGrid)
 {
     TileIterator oGrid(11, 7);

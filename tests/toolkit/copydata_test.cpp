@@ -11,37 +11,6 @@ using namespace krv;
 using namespace krv::raster;
 using namespace krv::test;
 
-TEST(CopyDataTest, EveryPairOfTypesAtItsBoundaries)
-{
-    for (int nFrom = 0; nFrom < 15; ++nFrom)
-        for (int nTo = 0; nTo < 15; ++nTo)
-        {
-            const Type oFrom(nFrom);
-            const Type oTo(nTo);
-            std::vector<unsigned char> oSource = BoundaryValues(*oFrom.mpoPart);
-            oSource.insert(oSource.begin(), 0); // so that nothing is aligned
-            const std::size_t nCount = (oSource.size() - 1) / oFrom.Bytes();
-            std::vector<unsigned char> oTarget(nCount * oTo.Bytes() + 1, 0xAA);
-            CopyData(oSource.data() + 1, static_cast<BufferType>(nFrom), 1, oTarget.data() + 1,
-                     static_cast<BufferType>(nTo), 1, nCount);
-            for (std::size_t i = 0; i < nCount; ++i)
-            {
-                unsigned char oExpected[16];
-                const unsigned char* pSource = oSource.data() + 1 + i * oFrom.Bytes();
-                ModelValue(pSource, oFrom, oExpected, oTo);
-                for (int nPart = 0; nPart < oTo.mnParts; ++nPart)
-                {
-                    const int nOffset = nPart * oTo.mpoPart->mnBytes;
-                    const unsigned char* pGot = oTarget.data() + 1 + i * oTo.Bytes() + nOffset;
-                    ASSERT_TRUE(Same(pGot, oExpected + nOffset, *oTo.mpoPart))
-                        << "type " << nFrom << " to " << nTo << ", part " << nPart << " of "
-                        << oFrom.mpoPart->Load(pSource) << ": " << oTo.mpoPart->Load(pGot) << " instead of "
-                        << oTo.mpoPart->Load(oExpected + nOffset);
-                }
-            }
-        }
-}
-
 TEST(MergerTest, WhatDoesNotExistIsRefused)
 {
     EXPECT_THROW(Merger({{eBT_8U, 3}}, eBT_8U, {{0, 3}}), DataException);

@@ -70,18 +70,6 @@ TEST(HMallocTest, BlocksOfAnySizeAreAlignedAndUsable)
 #endif
 }
 
-TEST(HMallocTest, KeepsFreedBlocksExceptUnderSanitizers)
-{
-    HTrim();
-    HFree(HMalloc(3 * MIB));
-#ifdef KRV_SANITIZED
-    EXPECT_EQ(HKeptBytes(), 0u);
-#else
-    EXPECT_EQ(HKeptBytes(), 3 * MIB);
-#endif
-    HTrim();
-}
-
 TEST(BlockPoolTest, ClassesHoldTheirSizesWithLittleWaste)
 {
     for (std::size_t nBytes = BlockPool::SMALLEST_KEPT; nBytes <= BlockPool::MOST_KEPT; nBytes += 1 + nBytes / 97)
@@ -142,14 +130,6 @@ TEST(BlockPoolTest, KeepsNoMoreThanThePeakAndTheLimit)
     EXPECT_GT(oPool->GetKeptBytes(), BlockPool::MOST_KEPT - 30 * MIB);
     oPool.Cycle({BlockPool::MOST_KEPT + 1});
     EXPECT_LE(oPool->GetKeptBytes(), BlockPool::MOST_KEPT);
-}
-
-TEST(BlockPoolTest, SmallBlocksAreNotKept)
-{
-    TestPool oPool;
-    oPool.Cycle({BlockPool::SMALLEST_KEPT - 1, 100, 1});
-    EXPECT_EQ(oPool->GetKeptBytes(), 0u);
-    EXPECT_EQ(oPool->GetPeakBytes(), 0u);
 }
 
 // A block that serves a smaller request for want of a better one does not keep out the size that is wanted.

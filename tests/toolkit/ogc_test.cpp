@@ -29,35 +29,6 @@ const char* const WKT1_UTM =
     "PARAMETER[\"latitude_of_origin\",0],PARAMETER[\"central_meridian\",9],PARAMETER[\"scale_factor\",0.9996],"
     "PARAMETER[\"false_easting\",500000],PARAMETER[\"false_northing\",0],UNIT[\"metre\",1]]";
 
-// A reference system of somebody else's, known to the toolkit only by what ICRS says.
-class ForeignCRS : public ICRS
-{
-public:
-    explicit ForeignCRS(int nCode) : mpoCRS(CreateCRSFromEPSG(nCode)) {}
-
-    ICRS* Clone() const override { return mpoCRS->Clone(); }
-    std::string GetName() const override { return mpoCRS->GetName(); }
-    int GetEPSG() const override { return mpoCRS->GetEPSG(); }
-    std::string GetWKT() const override { return mpoCRS->GetWKT(); }
-    std::string GetWKT1() const override { return mpoCRS->GetWKT1(); }
-    std::string GetPROJJSON() const override { return mpoCRS->GetPROJJSON(); }
-    bool IsEquivalent(const ICRS& oOther) const override { return oOther.IsEquivalent(*mpoCRS); }
-    bool IsGeographic() const override { return mpoCRS->IsGeographic(); }
-    bool IsProjected() const override { return mpoCRS->IsProjected(); }
-    bool HasVertical() const override { return mpoCRS->HasVertical(); }
-    std::string GetUnitName() const override { return mpoCRS->GetUnitName(); }
-    double GetUnitFactor() const override { return mpoCRS->GetUnitFactor(); }
-    std::string GetDatumName() const override { return mpoCRS->GetDatumName(); }
-    std::string GetEllipsoidName() const override { return mpoCRS->GetEllipsoidName(); }
-    std::string GetProjectionMethod() const override { return mpoCRS->GetProjectionMethod(); }
-    double GetSemiMajorAxis() const override { return mpoCRS->GetSemiMajorAxis(); }
-    double GetInverseFlattening() const override { return mpoCRS->GetInverseFlattening(); }
-    std::vector<ProjectionParameter> GetProjectionParameters() const override { return {}; }
-
-private:
-    std::unique_ptr<ICRS> mpoCRS;
-};
-
 } // namespace
 
 TEST(GeocodingInfo, MapsThereAndBack)
@@ -180,17 +151,6 @@ TEST(Crs, EquivalenceLooksAtTheGroundNotAtNames)
     swapped =
         swapped.substr(0, nNorth) + "AXIS[\"(E)\",east,ORDER[1]],AXIS[\"(N)\",north,ORDER[2]],LENGTHUNIT[\"metre\",1]]";
     EXPECT_TRUE(CreateCRSFromEPSG(3035)->IsEquivalent(*CreateCRSFromWKT(swapped)));
-}
-
-TEST(Crs, WorksWithImplementationsOfOthers)
-{
-    const ForeignCRS oForeign(32632);
-    EXPECT_TRUE(CreateCRSFromEPSG(32632)->IsEquivalent(oForeign));
-    EXPECT_FALSE(CreateCRSFromEPSG(32633)->IsEquivalent(oForeign));
-    double nX = 9.0;
-    double nY = 0.0;
-    ASSERT_TRUE(CoordinateTransformation(*CreateCRSFromEPSG(4326), oForeign).Transform(nX, nY));
-    EXPECT_NEAR(nX, 500000.0, 1e-6);
 }
 
 TEST(Crs, FailuresNameTheDefinitionAndTheCauseSilently)

@@ -189,17 +189,6 @@ TEST(XmlTree, KeepsNamesAttributesTextAndOrder)
     EXPECT_EQ(oRoot.FindChild("None"), nullptr);
 }
 
-TEST(XmlTree, KeepsLongTextsOfTwoUnitCharacters)
-{
-    for (const std::string& lead : {std::string(), std::string("x")})
-    {
-        std::string text = lead;
-        for (int nAt = 0; nAt < 100000; ++nAt)
-            text += "\xF0\x9F\x9B\xB0";
-        EXPECT_EQ(Tree("<a>" + text + "</a>").text, text);
-    }
-}
-
 TEST(XmlTree, RefusesWhatNobodyVouchesFor)
 {
     const std::string texts[] = {"",

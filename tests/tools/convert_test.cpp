@@ -425,41 +425,6 @@ TEST(Convert, StacksAndConvertsTypes)
     EXPECT_EQ(ReadPixels(BasicReader(out)), ReadPixels(MultiTypeReader(a, {2}, DataType(eDT_8U))));
 }
 
-TEST(Convert, ACloudOptimisedCopyHasItsLevels)
-{
-    const TempFolder oFolder;
-    const std::string a = oFolder.File("a.dem"), out = oFolder.File("out.tif"), plain = oFolder.File("plain.tif");
-    krv::test::WriteDemoFile(a, 900, 600, {krv::gobs::eDT_16U, krv::gobs::eDT_16U});
-    ASSERT_EQ(RunConvert({a, out, "--options", "layout=cog COMPRESS=ZSTD"}).code, 0);
-    ASSERT_EQ(RunConvert({a, plain}).code, 0);
-    ASSERT_EQ(RunKrv({"overviews", plain}).code, 0);
-    EXPECT_EQ(Sums(out), Sums(a));
-    EXPECT_EQ(RunKrv({"info", out, "--json"}).Json()["overviews"],
-              RunKrv({"info", plain, "--json"}).Json()["overviews"]);
-    const auto oLevel = RunKrv({"checksum", out, "--level", "4"});
-    EXPECT_EQ(oLevel.code, 0) << oLevel.errors;
-    EXPECT_EQ(oLevel.output, RunKrv({"checksum", plain, "--level", "4"}).output);
-    EXPECT_EQ(std::distance(std::filesystem::directory_iterator(oFolder.GetPath()), {}), 3);
-}
-
-// Types that TIFF cannot mix stay apart in a format that can.
-TEST(Convert, MixedTypesGoIntoAFormatThatHoldsThem)
-{
-    const TempFolder oFolder;
-    const std::string a = oFolder.File("a.dem"), out = oFolder.File("out.dem");
-    krv::test::WriteDemoFile(a, 70, 50, {krv::gobs::eDT_8U, krv::gobs::eDT_32R, krv::gobs::eDT_C16S});
-    const auto oRun = RunConvert({a, a, out, "--channels", "3,1,2,5", "--format", "DEMO"});
-    if (oRun.errors.find("cannot create") != std::string::npos)
-        GTEST_SKIP() << oRun.errors;
-    ASSERT_EQ(oRun.code, 0) << oRun.errors;
-    const json oOld = RunKrv({"checksum", a, "--json"}).Json()["channels"];
-    const json oNew = RunKrv({"checksum", out, "--json"}).Json()["channels"];
-    ASSERT_EQ(oNew.size(), 4U);
-    std::size_t nAt = 0;
-    for (const std::size_t nFrom : {2U, 0U, 1U, 1U})
-        EXPECT_EQ(oNew[nAt++]["crc32"], oOld[nFrom]["crc32"]);
-}
-
 TEST(Convert, BitmapsAreCut)
 {
     const TempFolder oFolder;

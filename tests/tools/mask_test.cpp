@@ -18,7 +18,6 @@
 #include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
-#include <png.h>
 
 #include <algorithm>
 #include <cmath>
@@ -241,32 +240,6 @@ TEST_F(MaskCommand, NoDataIsStoredAsItsComplement)
     EXPECT_GT(nAny, 0);
     EXPECT_EQ(RunKrv({"mask", mixed, "--no-data", "--json"}).Json()["set"], nAny);
     EXPECT_EQ(RunKrv({"mask", mixed, "--no-data", "--rule", "all", "--json"}).Json()["set"], nAll);
-}
-
-TEST_F(MaskCommand, DrawsTheShareOfSetPixels)
-{
-    const std::string picture = moFolder.File("mask.png");
-    ASSERT_EQ(RunKrv({"mask", moFile, "--polygon", "POLYGON((0 0, 500 0, 500 718, 0 718))", "--coordinates", "pixel",
-                      "--png", picture, "--size", "100"})
-                  .code,
-              0);
-    png_image oImage{};
-    oImage.version = PNG_IMAGE_VERSION;
-    ASSERT_NE(png_image_begin_read_from_file(&oImage, picture.c_str()), 0);
-    EXPECT_EQ(oImage.width, 100u);
-    EXPECT_EQ(oImage.height, 91u);
-    oImage.format = PNG_FORMAT_GRAY;
-    std::string grey(PNG_IMAGE_SIZE(oImage), '\0');
-    ASSERT_NE(png_image_finish_read(&oImage, nullptr, grey.data(), 0, nullptr), 0);
-    const auto At = [&grey](unsigned int x, unsigned int y)
-    {
-        return static_cast<unsigned char>(grey[y * 100 + x]);
-    };
-    EXPECT_EQ(At(0, 0), 255);
-    EXPECT_EQ(At(62, 90), 255);
-    // Columns 499 to 506 of the image make column 63: one of eight is set.
-    EXPECT_EQ(At(63, 45), 32);
-    EXPECT_EQ(At(64, 45), 0);
 }
 
 TEST_F(MaskCommand, FailuresSayWhyOnOneLineAndChangeNothing)

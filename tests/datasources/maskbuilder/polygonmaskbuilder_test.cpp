@@ -38,54 +38,9 @@ std::unique_ptr<Mask> Build(const PolygonMaskBuilder& oBuilder, unsigned int nWi
     return std::unique_ptr<Mask>(oBuilder.BuildMask(oRaster));
 }
 
-// The set columns of a row as text: file columns.
-std::string ColumnsOf(const Mask& oMask, int nRow)
-{
-    std::string text;
-    const int nFirst = oMask.GetX() - static_cast<int>(oMask.GetXMargin());
-    const int nFirstRow = oMask.GetY() - static_cast<int>(oMask.GetYMargin());
-    for (std::uint64_t c = 0; c < oMask.GetFullWidth(); ++c)
-        text += oMask.GetBit(c, static_cast<std::uint64_t>(nRow - nFirstRow))
-                    ? std::to_string(nFirst + static_cast<int>(c)) + " "
-                    : "";
-    return text;
-}
-
 Ring Box(double nLeft, double nRight, double nTop = 0, double nBottom = 1)
 {
     return {{nLeft, nTop}, {nRight, nTop}, {nRight, nBottom}, {nLeft, nBottom}};
-}
-
-TEST(PolygonMaskBuilder, SpansFollowTheRule)
-{
-    struct Case
-    {
-        double left;
-        double right;
-        const char* columns;
-    };
-    for (const Case& oCase : {Case{2.4, 5.6, "2 3 4 5 "}, Case{2.6, 2.9, "3 "}, Case{-3, 0.3, "-2 -1 0 "},
-                              Case{-2.6, -1.6, "-2 "}, Case{2, 2, "2 "}, Case{6.5, 1e300, "7 8 9 "}, Case{-9, -5, ""},
-                              Case{-1e300, 1e300, "-4 -3 -2 -1 0 1 2 3 4 5 6 7 8 9 "}, Case{12, 14, ""}})
-    {
-        const auto poMask =
-            Build(PolygonMaskBuilder(ShapeOf({Box(oCase.left, oCase.right)}), 0, 0), 6, 1, {0, 0, 4, 0});
-        EXPECT_EQ(ColumnsOf(*poMask, 0), oCase.columns) << oCase.left << " to " << oCase.right;
-    }
-}
-
-TEST(PolygonMaskBuilder, ClipsFarAndNothing)
-{
-    PolygonMaskBuilder oBuilder(ShapeOf({Box(0, 100, 0, 100)}), 0, 0);
-    using Clip = GGLTIntRect<int>;
-    for (const auto& [oClip, nSet] :
-         {std::pair(Clip{0, 0, 0, 0}, 600u), std::pair(Clip{10, 10, 5, 5}, 25u),
-          std::pair(Clip{2147483000, 2147483000, 2147483647, 2147483647}, 0u), std::pair(Clip{5, 5, 0, 0}, 0u)})
-    {
-        oBuilder.SetClipRect(oClip);
-        EXPECT_EQ(Build(oBuilder, 30, 20)->CountSet(), nSet);
-        EXPECT_EQ(Build(PolygonMaskBuilder(oBuilder), 30, 20)->CountSet(), nSet);
-    }
 }
 
 TEST(PolygonMaskBuilder, HostileOutlinesDoNoHarm)

@@ -184,27 +184,6 @@ TEST(AuxiliaryData, AppendAcceptsTheChannelsOwnMap)
     EXPECT_EQ(oData.GetChanMetadata(1), oBefore);
 }
 
-TEST(AuxiliaryData, CopiesAreIndependentAndFilteringWithoutFiltersIsACopy)
-{
-    AuxiliaryData oSource(2);
-    oSource.SetFileMetadataValue("file", "1");
-    oSource.SetChanMetadataValue("chan", "2", 2);
-    oSource.SetChannelDescription("second", 2);
-    AuxiliaryData oCopy = oSource.GetFilteredMeta(nullptr, nullptr);
-    EXPECT_TRUE(oCopy.IsModified());
-    EXPECT_EQ(oCopy.GetFileMetadata(), oSource.GetFileMetadata());
-    EXPECT_EQ(oCopy.GetChanMetadata(2), oSource.GetChanMetadata(2));
-    EXPECT_EQ(oCopy.GetChannelDescription(2), "second");
-
-    oCopy.SetChannelDescription("changed", 2);
-    EXPECT_EQ(oSource.GetChannelDescription(2), "second");
-    const AuxiliaryData& oSelf = oSource;
-    oSource = oSelf;
-    EXPECT_EQ(oSource.GetChanMetadataValue("chan", 2), "2");
-    oSource = AuxiliaryData(5);
-    EXPECT_EQ(oSource.GetChannelCount(), 5u);
-}
-
 TEST(AuxiliaryData, FilterTakesOutWhatItSelects)
 {
     AuxiliaryData oData(2);
@@ -243,23 +222,6 @@ TEST(AuxiliaryData, CleaningRemovesTheBookkeepingTagsAlone)
 
     oData.SetFileMetadata({{"_dblayout", "x"}});
     EXPECT_EQ(oData.GetCleanedMeta().GetFileMetadata().size(), 1u);
-}
-
-TEST(AuxiliaryData, HostileTagsAreHeldByteForByte)
-{
-    const std::string LONG(1 << 20, '_');
-    const std::string NUL("a\0b", 3);
-    AuxiliaryData oData(1);
-    oData.SetChanMetadataValue(LONG, LONG, 1);
-    oData.SetChanMetadataValue(NUL, NUL, 1);
-    oData.SetChanMetadataValue("\xFF\xC0\x80", "\xFE\n", 1);
-    for (int n = 0; n < 5000; ++n)
-        oData.SetChanMetadataValue("_Overview_" + std::to_string(n), "", 1);
-    const AuxiliaryData oCleaned = oData.GetCleanedMeta();
-    EXPECT_EQ(oCleaned.GetChanMetadata(1).size(), 3u);
-    EXPECT_EQ(oCleaned.GetChanMetadataValue(LONG, 1), LONG);
-    EXPECT_EQ(oCleaned.GetChanMetadataValue("A", 1), NUL); // keys end at their first NUL
-    EXPECT_EQ(oCleaned.GetChanMetadataValue("\xFF\xC0\x80", 1), "\xFE\n");
 }
 
 } // namespace krv::datasources

@@ -185,28 +185,4 @@ TEST(TypedNoData, TakesTheChannelsElseTheFilesText)
     EXPECT_THROW(GetTypedNoDataMaskBuilder(Record("five", ""), krv::gobs::eAnyChannel), krv::DataException);
 }
 
-TEST(TypedNoData, MasksMarkNaNAndLargeIntegersExactly)
-{
-    krv::gobs::Raster oReals(krv::gobs::RasterInfo(4, 1, 1, krv::gobs::eDT_32R), krv::gobs::RasterContext());
-    const float REALS[] = {1, NAN, 0, -9999};
-    std::memcpy(oReals.GetBuffer(), REALS, sizeof REALS);
-    AuxiliaryData oData(1);
-    const auto oBits = [&](const krv::gobs::Raster& oRaster, const char* pText, bool bNaN)
-    {
-        oData.SetFileMetadataValue(KEY, pText);
-        const Builder oBuilder(GetTypedNoDataMaskBuilder(oData, krv::gobs::eAnyChannel, bNaN));
-        return std::unique_ptr<krv::gobs::Mask>(oBuilder->BuildMask(oRaster))->GetBits()[0];
-    };
-    EXPECT_EQ(oBits(oReals, "nan", false), 0x40);
-    EXPECT_EQ(oBits(oReals, "-9999", false), 0x10);
-    EXPECT_EQ(oBits(oReals, "-9999", true), 0x50);
-
-    krv::gobs::Raster oIntegers(krv::gobs::RasterInfo(3, 1, 1, krv::gobs::eDT_64S), krv::gobs::RasterContext());
-    const std::int64_t INTEGERS[] = {INT64_MAX, INT64_MAX - 1, INT64_MIN + 1};
-    std::memcpy(oIntegers.GetBuffer(), INTEGERS, sizeof INTEGERS);
-    EXPECT_EQ(oBits(oIntegers, "9223372036854775806", false), 0x40);
-    EXPECT_EQ(oBits(oIntegers, "-9223372036854775807", false), 0x20);
-    EXPECT_EQ(oBits(oIntegers, "9.2233720368547758e18", false), 0x80);
-}
-
 } // namespace krv::datasources

@@ -428,69 +428,6 @@ TEST_F(OverviewBuilderTest, OptionsChangeWhatIsValidAndWhatIsAveraged)
     EXPECT_EQ(Build({3, 4, -5, 1, 1, 0, 2, 2}, krv::gobs::eDT_C32R, {}), (std::vector<float>{-5, 1}));
 }
 
-// A writer of another family, which stands on one of ours.
-class OtherWriter : public IRasterWriter, public krv::datasources::IDatasetAccess
-{
-public:
-    explicit OtherWriter(BasicWriter& oWriter) : o(oWriter) {}
-    IDataset* GetDataset() const override { return o.GetDataset(); }
-    const Channels& GetChannels() const override { return o.GetChannels(); }
-    Raster* GetRaster(unsigned int n) override { return o.GetRaster(n); }
-    krv::datasources::RasterIterator FindRaster(unsigned int x, unsigned int y) override { return o.FindRaster(x, y); }
-    krv::datasources::RasterIterator Begin() override { return o.Begin(); }
-    krv::datasources::RasterIterator End() override { return o.End(); }
-    unsigned int GetTileCount() const override { return o.GetTileCount(); }
-    void SetOptimalTileSize() override { o.SetOptimalTileSize(); }
-    void SetTileSize(unsigned int w, unsigned int h) override { o.SetTileSize(w, h); }
-    unsigned int GetTileWidth() const override { return o.GetTileWidth(); }
-    unsigned int GetTileHeight() const override { return o.GetTileHeight(); }
-    const std::vector<krv::datasources::IChannelInfo*>& GetChannelsInfo() const override { return o.GetChannelsInfo(); }
-    krv::datasources::IFileFormat* GetFileFormat() const override { return o.GetFileFormat(); }
-    void SetMargins(unsigned int x, unsigned int y, eMarginBehaviour e) override { o.SetMargins(x, y, e); }
-    unsigned int GetXMargin() const override { return o.GetXMargin(); }
-    unsigned int GetYMargin() const override { return o.GetYMargin(); }
-    eMarginBehaviour GetMarginBehaviour() const override { return o.GetMarginBehaviour(); }
-    void ReadRaster(Raster* p) override { o.ReadRaster(p); }
-    Raster* ReadRaster(unsigned int x, unsigned int y, unsigned int w, unsigned int h) override
-    {
-        return o.ReadRaster(x, y, w, h);
-    }
-    krv::datasources::AuxiliaryData GetAuxiliaryData() const override { return o.GetAuxiliaryData(); }
-    krv::ogc::cs::ICRS* GetCRS() const override { return o.GetCRS(); }
-    krv::ogc::cs::GeocodingInfo* GetGeocodingInfo() const override { return o.GetGeocodingInfo(); }
-    krv::datasources::IOverviewReaderAccessor* GetOverviewReaderAccessor() override
-    {
-        return o.GetOverviewReaderAccessor();
-    }
-    unsigned int GetWidth() const override { return o.GetWidth(); }
-    unsigned int GetHeight() const override { return o.GetHeight(); }
-    unsigned int GetChansCount() const override { return o.GetChansCount(); }
-    const DataType& GetDataType() const override { return o.GetDataType(); }
-    void WriteRaster(const Raster* p) override { o.WriteRaster(p); }
-    bool FileExists() override { return o.FileExists(); }
-    void CreateNewFile(const krv::gobs::RasterInfo& oInfo) override { o.CreateNewFile(oInfo); }
-    void SetAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override { o.SetAuxiliaryData(oData); }
-    void SetCRS(const krv::ogc::cs::ICRS* p) override { o.SetCRS(p); }
-    void SetGeocodingInfo(const krv::ogc::cs::GeocodingInfo& oInfo) override { o.SetGeocodingInfo(oInfo); }
-    IOverviewWriterAccessor* GetOverviewWriterAccessor() override { return o.GetOverviewWriterAccessor(); }
-    void Synchronize() override { o.Synchronize(); }
-
-private:
-    BasicWriter& o;
-};
-
-TEST_F(OverviewBuilderTest, WritersOfOtherFamiliesKeepTheMask)
-{
-    const Case oCase{"AVERAGE", krv::gobs::eDT_8U, 2, {}, true, {2, 5}};
-    Picture oImage;
-    std::string bytes;
-    BasicWriter oWriter(Make(oCase, oImage, bytes));
-    OtherWriter oOther(oWriter);
-    ASSERT_TRUE(BuildOverviews(oOther, oCase.moFactors, oCase.mpMethod));
-    for (const unsigned int nFactor : oCase.moFactors)
-        ExpectLevel(oWriter, oCase, oImage, nFactor);
-}
-
 // All of the level is spoilt before; what the change does not reach stays so.
 TEST_F(OverviewBuilderTest, ChangedPartIsRebuiltAlone)
 {
@@ -589,60 +526,6 @@ TEST_F(OverviewBuilderTest, CancelAndFailuresLeaveTheFileAsItWas)
             ASSERT_FALSE(moProbe.HasOrphans()) << "call " << nCall;
         }
         ASSERT_FALSE(HasLevels()) << "call " << nCall;
-    }
-}
-
-// A mask and levels of other sizes, as other programs leave them, and a real image's own no-data value.
-TEST_F(OverviewBuilderTest, RealFilesGetTheirLevels)
-{
-    const std::string folder = krv::test::DataFolder();
-    const struct
-    {
-        const char* mpFile;
-        Case moCase;
-    } FILES[] = {
-        {"optical/RGB.byte.tif", {"AVERAGE", krv::gobs::eDT_8U, 3, 0, false, {2, 4, 8}}},
-        {"mask/hro_colorado_mask.tif", {"AVERAGE", krv::gobs::eDT_8U, 3, {}, true, {2, 3}}},
-        {"overview/cog_gcps_ovr.tif", {"CUBIC", krv::gobs::eDT_8U, 1, 0, false, {2, 16}}},
-        {"overview/diagonal.tif", {"RMS", krv::gobs::eDT_32R, 1, {}, false, {2}}},
-    };
-    if (!std::filesystem::exists(folder))
-        GTEST_SKIP() << "no real files at " << folder;
-    for (const auto& oFile : FILES)
-    {
-        const std::string file = moHome.GetFolder().GetPath() + "/real.tif";
-        std::filesystem::copy_file(folder + "/" + oFile.mpFile, file,
-                                   std::filesystem::copy_options::overwrite_existing);
-        std::filesystem::permissions(file, std::filesystem::perms::owner_all);
-        Case oCase = oFile.moCase;
-        Picture oImage;
-        {
-            BasicWriter oWriter(file);
-            ASSERT_TRUE(BuildOverviews(oWriter, oCase.moFactors, oCase.mpMethod));
-            oWriter.Synchronize();
-        }
-        BasicWriter oWriter(file);
-        oCase.mnWidth = oWriter.GetWidth();
-        oCase.mnHeight = oWriter.GetHeight();
-        oImage = {oCase.mnWidth, oCase.mnHeight, oCase.mnChannels, {}, {}};
-        oImage.moValues.resize(std::size_t{oCase.mnWidth} * oCase.mnHeight * oCase.mnChannels);
-        oImage.moValid.assign(oImage.moValues.size(), true);
-        std::string bytes = ReadPixels(oWriter);
-        ConvertAs(oCase.meType, oImage.moValues, bytes, false);
-        std::vector<unsigned char> oBits(std::size_t{oCase.mnWidth} * oCase.mnHeight, 1);
-        if (oCase.mbMask)
-        {
-            auto& oBitmaps = dynamic_cast<IBitmapDataset&>(*oWriter.GetDataset());
-            const std::unique_ptr<krv::datasources::IRasterIO> oIO(oBitmaps.GetBitmapIO({1}));
-            oIO->ReadWindow(0u, 0u, oCase.mnWidth, oCase.mnHeight, oBits.data());
-        }
-        for (std::size_t n = 0; n < oImage.moValues.size(); ++n)
-            oImage.moValid[n] =
-                oBits[n / oCase.mnChannels] != 0 && !(oCase.moNoData && oImage.moValues[n] == *oCase.moNoData);
-        for (const unsigned int nFactor : oCase.moFactors)
-            ExpectLevel(oWriter, oCase, oImage, nFactor);
-        if (HasFatalFailure())
-            return;
     }
 }
 

@@ -283,47 +283,6 @@ TEST_F(BasicReaderTest, MarginsAreLimitedToHalfTheImage)
     EXPECT_EQ(oRaster->GetYMargin(), 2u);
 }
 
-// Which form of the transfer serves a window, and when the border is an error.
-TEST_F(BasicReaderTest, BordersAndTheirExceptions)
-{
-    const struct
-    {
-        const char* mpWhat;
-        int mnX, mnY;
-        unsigned int mnWidth, mnHeight, mnXMargin, mnYMargin;
-        bool mbBorder;
-    } CASES[] = {
-        {"no margins, whole image", 0, 0, 21, 17, 0, 0, false},
-        {"no margins, last pixel", 20, 16, 1, 1, 0, 0, false},
-        {"interior", 5, 5, 4, 4, 1, 1, false},
-        {"left margin begins at the edge", 3, 5, 4, 4, 3, 1, false},
-        {"left margin partly outside", 2, 5, 4, 4, 3, 1, true},
-        {"top margin partly outside", 5, 0, 4, 4, 1, 1, true},
-        {"right margin one short of the edge", 15, 5, 4, 4, 1, 1, false},
-        {"right margin ends at the edge", 16, 5, 4, 4, 1, 1, true},
-        {"bottom margin one short of the edge", 5, 10, 4, 5, 1, 1, false},
-        {"bottom margin ends at the edge", 5, 11, 4, 5, 1, 1, true},
-        {"last rows without a margin of their own", 5, 13, 4, 4, 2, 0, true},
-        {"last columns without a margin of their own", 17, 5, 4, 4, 0, 2, true},
-        {"first rows without a margin of their own", 5, 0, 4, 4, 2, 0, false},
-    };
-    BasicReader oReader(moFile, {1});
-    for (const auto& oCase : CASES)
-    {
-        SCOPED_TRACE(oCase.mpWhat);
-        krv::gobs::Raster oRaster({oCase.mnWidth, oCase.mnHeight, 1, oReader.GetDataType()},
-                                  {oCase.mnX, oCase.mnY, oCase.mnXMargin, oCase.mnYMargin});
-        oReader.SetMargins(0, 0, eException);
-        EXPECT_EQ(Error([&] { oReader.ReadRaster(&oRaster); }),
-                  oCase.mbBorder ? "data: Margin behaviour is eException" : "");
-        oReader.SetMargins(0, 0, eMirror);
-        moProbe.Arm(0);
-        oReader.ReadRaster(&oRaster);
-        EXPECT_EQ(moProbe.GetCalls(),
-                  std::vector<std::string>{oCase.mbBorder ? "IO::ReadWindow/long" : "IO::ReadWindow/short"});
-    }
-}
-
 TEST_F(BasicReaderTest, PositionsBeyond32BitsAreRefusedBeforeReading)
 {
     constexpr int LAST = std::numeric_limits<int>::max();

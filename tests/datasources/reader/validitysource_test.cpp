@@ -186,39 +186,4 @@ TEST_F(ValiditySourceTest, RefusesWhatItCannotAsk)
     EXPECT_THROW(ValiditySource oSource(&moDataset), krv::DataException);
 }
 
-// The same scene, whose missing pixels are marked in three ways.
-TEST(RealValidity, NoDataBitmapsAndAlphaOfFiles)
-{
-    const std::string folder = krv::test::DataFolder();
-    if (!std::filesystem::exists(folder))
-        GTEST_SKIP() << "there are no real files in " << folder;
-    struct Case
-    {
-        const char* mpFile;
-        bool mbNoData, mbBitmap, mbAlpha;
-    };
-    const Case CASES[] = {{"mask/cog_uint8_rgb_nodata.tif", true, false, false},
-                          {"mask/cog_uint8_rgb_mask.tif", false, true, false},
-                          {"mask/cog_uint8_rgba.tif", false, false, true}};
-    std::vector<std::uint64_t> oCounts;
-    for (const Case& oCase : CASES)
-    {
-        SCOPED_TRACE(oCase.mpFile);
-        const std::unique_ptr<IDataset> oDataset(
-            DatasetManager::GetInstance()->Open(folder + "/" + oCase.mpFile, eReadOnly));
-        const ValiditySource oSource(oDataset.get());
-        EXPECT_EQ(oSource.HasNoData(), oCase.mbNoData);
-        EXPECT_EQ(oSource.HasBitmap(), oCase.mbBitmap);
-        EXPECT_EQ(oSource.HasAlpha(), oCase.mbAlpha);
-        BasicReader oReader(oDataset.get(), {}, false);
-        std::uint64_t nValid = 0;
-        for (const auto poTile : RasterRange(oReader))
-            nValid += std::unique_ptr<krv::gobs::Mask>(oSource.BuildMask(*poTile))->CountSet();
-        EXPECT_GT(nValid, 0u);
-        EXPECT_LT(nValid, std::uint64_t{oReader.GetWidth()} * oReader.GetHeight());
-        oCounts.push_back(nValid);
-    }
-    EXPECT_EQ(oCounts[1], oCounts[2]);
-}
-
 } // namespace krv::datasources

@@ -194,12 +194,4 @@ TEST(LzwEncoder, ComesBackInBothEditions)
             }
 }
 
-TEST(LzwDecoder, NeedsNothingForEmptyOutput)
-{
-    LzwDecoder oDecoder;
-    EXPECT_TRUE(oDecoder.Decode(nullptr, 0, nullptr, 0).IsDone());
-    unsigned char nByte = 0;
-    EXPECT_EQ(Status::eTruncated, oDecoder.Decode(nullptr, 0, &nByte, 1).moStatus);
-}
-
 } // namespace

@@ -118,20 +118,6 @@ TYPED_TEST(StreamDecoder, ChangedStreamsAreNotTakenForGood)
     EXPECT_LT(nWrong, 1U);
 }
 
-TYPED_TEST(StreamDecoder, ADecoderGoesOnAfterAFault)
-{
-    const Bytes oData = this->MakeData(4);
-    const Bytes oStream = TypeParam::Encode(oData);
-    for (int i = 0; i < 3; ++i)
-    {
-        ASSERT_FALSE(this->Decode(Bytes(oStream.begin(), oStream.begin() + 8), oData.size()).IsDone());
-        ASSERT_TRUE(this->Decode(oStream, oData.size()).IsDone());
-        auto oMoved = std::move(this->moDecoder);
-        this->moDecoder = std::move(oMoved);
-        ASSERT_TRUE(oData == this->moOutput);
-    }
-}
-
 TEST(StreamEnds, MayBeCutOffButNotChanged)
 {
     std::mt19937 oRandom(1);
@@ -170,13 +156,6 @@ TEST(StreamEnds, MayBeCutOffButNotChanged)
         EXPECT_EQ(oCase.status, oResult.moStatus) << oCase.name;
         EXPECT_EQ(oCase.more, oResult.mbMore) << oCase.name;
     }
-}
-
-TEST(Status, EveryOneHasItsText)
-{
-    for (const Status oStatus : {Status::eDone, Status::eTruncated, Status::eCorrupt, Status::eNoMemory})
-        EXPECT_NE(std::string(), StatusText(oStatus));
-    EXPECT_STRNE(StatusText(Status::eTruncated), StatusText(Status::eCorrupt));
 }
 
 } // namespace

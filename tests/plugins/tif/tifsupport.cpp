@@ -227,4 +227,16 @@ std::vector<std::string> ListFolder(const std::string& folder)
     return oNames;
 }
 
+Bytes Handmade::Finish(std::uint32_t nNext, std::size_t nSize) const
+{
+    Bytes oFile;
+    for (const unsigned int nByte : {0x49U, 0x49U, 42U, 0U, 8U, 0U, 0U, 0U, mnEntries, 0U})
+        oFile.push_back(static_cast<unsigned char>(nByte));
+    oFile.insert(oFile.end(), moEntries.begin(), moEntries.end());
+    for (int nByte = 0; nByte < 4; ++nByte)
+        oFile.push_back(static_cast<unsigned char>(nNext >> (8 * nByte)));
+    oFile.resize(std::max(nSize, oFile.size()));
+    return oFile;
+}
+
 } // namespace krv::test

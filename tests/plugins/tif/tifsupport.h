@@ -80,15 +80,7 @@ public:
         ++mnEntries;
     }
 
-    Bytes Finish(std::uint32_t nNext = 0, std::size_t nSize = 0) const
-    {
-        Bytes oFile = {'I', 'I', 42, 0, 8, 0, 0, 0, static_cast<unsigned char>(mnEntries), 0};
-        oFile.insert(oFile.end(), moEntries.begin(), moEntries.end());
-        for (int nByte = 0; nByte < 4; ++nByte)
-            oFile.push_back(static_cast<unsigned char>(nNext >> (8 * nByte)));
-        oFile.resize(std::max(nSize, oFile.size()));
-        return oFile;
-    }
+    Bytes Finish(std::uint32_t nNext = 0, std::size_t nSize = 0) const;
 
     // One channel of 8 bits in strips.
     static Handmade Image(std::uint32_t nWidth, std::uint32_t nHeight, std::uint32_t nRowsPerStrip,

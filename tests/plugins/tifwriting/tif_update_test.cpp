@@ -32,75 +32,6 @@ constexpr const char* KINDS[] = {"COMPRESS=NONE BLOCKXSIZE=32 BLOCKYSIZE=32", "C
                                  "COMPRESS=LZW BLOCKXSIZE=48 BLOCKYSIZE=16 INTERLEAVE=BAND",
                                  "COMPRESS=ZSTD BLOCKXSIZE=64 BLOCKYSIZE=64 BIGTIFF=YES"};
 
-TEST(TifUpdate, RandomWindowsOfRandomChannelsEqualAPlainImage)
-{
-    const TempFolder oFolder;
-    for (unsigned int nSeed = 0; nSeed < 12; ++nSeed)
-    {
-        SCOPED_TRACE("seed " + std::to_string(nSeed) + " " + KINDS[nSeed % 4]);
-        const std::string fileName = oFolder.File("w.tif");
-        Bytes oModel(100 * 90 * 3 * 2, 0);
-        std::mt19937 oRandom(nSeed);
-        TifPointer poDataset = CreateTif(fileName, KINDS[nSeed % 4], 100, 90, 3, krv::gobs::eDT_16S);
-        for (unsigned int nStep = 0; nStep < 60; ++nStep)
-        {
-            const std::vector<unsigned int> oChannels =
-                nStep % 3 == 0 ? std::vector<unsigned int>(1, 1 + static_cast<unsigned int>(oRandom() % 3))
-                               : std::vector<unsigned int>{1, 2, 3};
-            const auto nX = static_cast<unsigned int>(oRandom() % 100);
-            const auto nY = static_cast<unsigned int>(oRandom() % 90);
-            const auto nWidth = static_cast<unsigned int>(1 + oRandom() % (100 - nX));
-            const auto nHeight = static_cast<unsigned int>(1 + oRandom() % (90 - nY));
-            Bytes oWindow(std::size_t{nWidth} * nHeight * oChannels.size() * 2);
-            for (unsigned char& nByte : oWindow)
-                nByte = static_cast<unsigned char>(oRandom());
-            for (unsigned int nRow = 0; nRow < nHeight; ++nRow)
-                for (unsigned int nColumn = 0; nColumn < nWidth; ++nColumn)
-                    for (std::size_t nAt = 0; nAt < oChannels.size(); ++nAt)
-                        std::memcpy(&oModel[((nY + nRow) * 100 + nX + nColumn) * 6 + (oChannels[nAt] - 1) * 2],
-                                    &oWindow[((nRow * nWidth + nColumn) * oChannels.size() + nAt) * 2], 2);
-            IOPointer poIO(poDataset->GetRasterIO(oChannels));
-            poIO->WriteWindow(nX, nY, nWidth, nHeight, oWindow.data());
-            if (oRandom() % 8 == 0)
-                poDataset->Synchronize();
-            if (oRandom() % 10 == 0)
-            {
-                poIO.reset();
-                poDataset->Close();
-                poDataset = OpenTif(fileName, eUpdate);
-            }
-            ASSERT_TRUE(ReadAll(*poDataset) == oModel) << "step " << nStep;
-        }
-        poDataset->Close();
-        const Judgement oJudgement = Judge(fileName);
-        EXPECT_EQ(oJudgement.moComplaints, "");
-        EXPECT_TRUE(oJudgement.moPixels == oModel);
-    }
-}
-
-TEST(TifUpdate, WhatIsNotSynchronisedIsNotInTheFile)
-{
-    const TempFolder oFolder;
-    const std::string fileName = oFolder.File("u.tif");
-    for (const char* pKind : KINDS)
-    {
-        const Bytes oFirst = MakePixels(80, 70, 2, krv::gobs::eDT_8U, 1);
-        const Bytes oSecond = MakePixels(80, 70, 2, krv::gobs::eDT_8U, 2);
-        TifPointer poDataset = CreateTif(fileName, pKind, 80, 70, 2, krv::gobs::eDT_8U);
-        WriteAll(*poDataset, oFirst);
-        poDataset->Close();
-        poDataset = OpenTif(fileName, eUpdate);
-        WriteAll(*poDataset, oSecond);
-        EXPECT_TRUE(Judge(fileName).moPixels == oFirst) << pKind;
-        poDataset.reset();
-        EXPECT_TRUE(Judge(fileName).moPixels == oFirst) << pKind;
-        poDataset = OpenTif(fileName, eUpdate);
-        WriteAll(*poDataset, oSecond);
-        poDataset->Synchronize();
-        EXPECT_TRUE(Judge(fileName).moPixels == oSecond) << pKind;
-    }
-}
-
 // What a writer does besides filling all pixels with the number of the state, and the same number as a reader finds it;
 // nothing when there is none yet.
 struct WayOfWriting
@@ -532,44 +463,6 @@ TEST(TifUpdate, LevelsAreMadeWrittenMarkedAndDeleted)
     EXPECT_EQ(poLevels->GetLevels(), (std::vector<unsigned int>{2, 4, 64}));
 }
 
-TEST(TifUpdate, BitmapsKeepTheirNumbersAndAreWrittenTogether)
-{
-    const TempFolder oFolder;
-    const std::string fileName = oFolder.File("b.tif");
-    TifPointer poDataset = CreateTif(fileName, "COMPRESS=LZW", 61, 43, 1, krv::gobs::eDT_8U);
-    for (unsigned int nBitmap = 1; nBitmap <= 3; ++nBitmap)
-        EXPECT_EQ(poDataset->CreateBitmap(), nBitmap);
-    poDataset->SetBitmapDescription(1, "clouds");
-    poDataset->SetBitmapMetadata(3, {{"Kind", "water"}});
-    Bytes oBits(61 * 43 * 2);
-    for (std::size_t nAt = 0; nAt < oBits.size(); ++nAt)
-        oBits[nAt] = nAt % 3 == 0 || nAt % 7 == 0 ? 200 : 0;
-    {
-        const IOPointer poIO(poDataset->GetBitmapIO({3, 1}));
-        poIO->WriteWindow(0u, 0u, 61u, 43u, oBits.data());
-        // A part whose window begins outside the image: 3 x 2 pixels at (0, 1).
-        Bytes oWindow(10 * 10 * 2, 1);
-        poIO->WriteWindow(-4, -3, 10, 10, 4, 4, 3, 2, oWindow.data());
-        EXPECT_THROW(poIO->WriteWindow(0u, 1u, 61u, 43u, oBits.data()), krv::DataException);
-    }
-    poDataset->Close();
-    for (const unsigned int nRow : {1U, 2U})
-        std::fill_n(oBits.begin() + nRow * 61 * 2, 3 * 2, static_cast<unsigned char>(1));
-    Bytes oFirst(61 * 43);
-    for (std::size_t nAt = 0; nAt < oBits.size(); ++nAt)
-        oFirst[nAt / 2] = oBits[nAt] = oBits[nAt] != 0; // the second of two stays
-    EXPECT_TRUE(Judge(fileName, 1).moPixels == oFirst);
-    poDataset = OpenTif(fileName, eUpdate);
-    EXPECT_TRUE(ReadAll(*IOPointer(poDataset->GetBitmapIO({2})), 1) == Bytes(61 * 43, 0));
-    poDataset->DeleteBitmap(2);
-    poDataset->Close();
-    const TifPointer poRead = OpenTif(fileName);
-    EXPECT_EQ(poRead->GetBitmapList(), (std::vector<unsigned int>{1, 3}));
-    EXPECT_EQ(poRead->GetBitmapDescription(1), "clouds");
-    EXPECT_EQ(poRead->GetBitmapMetadata(3), (krv::datasources::MetadataMap{{"Kind", "water"}}));
-    EXPECT_TRUE(ReadAll(*IOPointer(poRead->GetBitmapIO({3, 1})), 2) == oBits);
-}
-
 // Kind and photometric interpretation of each page, as libtiff has them.
 std::string KindsOf(const std::string& fileName)
 {
@@ -640,56 +533,6 @@ TEST(TifUpdate, BitmapsAreZonesOrTheValidityMask)
         EXPECT_EQ(oDataset.GetBitmapList(), (std::vector<unsigned int>{1, 2}));
     };
     EXPECT_EQ(Change(Nothing), "0/1 4/1 2/1 ");
-}
-
-// What the channels that stay have stays with them: pixels, levels, descriptions.
-TEST(TifUpdate, ChannelsAreAddedAndDeleted)
-{
-    const TempFolder oFolder;
-    for (const char* pKind : KINDS)
-    {
-        SCOPED_TRACE(pKind);
-        const std::string fileName = oFolder.File("c.tif");
-        const Bytes oPixels = MakePixels(80, 70, 3, krv::gobs::eDT_16U, 9);
-        const Bytes oLevel = MakePixels(40, 35, 3, krv::gobs::eDT_16U, 5);
-        TifPointer poDataset = CreateTif(fileName, pKind, 80, 70, 3, krv::gobs::eDT_16U);
-        WriteAll(*poDataset, oPixels);
-        AuxiliaryData oData = poDataset->ReadAuxiliaryData();
-        oData.SetChannelDescription("third", 3);
-        poDataset->WriteAuxiliaryData(oData);
-        std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poDataset->GetOverviewManager());
-        poLevels->CreateLevel(4); // nothing of it is ever stored
-        poLevels->CreateLevel(2);
-        WriteAll(*IOPointer(poLevels->GetOverviewIO(2, {1, 2, 3})), 6, oLevel);
-        for (const unsigned int nChannel : {1U, 2U, 3U})
-            poLevels->SetValid(nChannel, 2, true);
-        const unsigned int nBitmap = poDataset->CreateBitmap();
-        poDataset->Synchronize();
-        EXPECT_THROW(poDataset->AddNewChannel(krv::gobs::RasterInfo(80, 70, 1, krv::gobs::eDT_32R)),
-                     krv::DataException);
-        poDataset->AddNewChannel(krv::gobs::RasterInfo(80, 70, 1, krv::gobs::eDT_16U));
-        poDataset->DeleteChannel(2);
-        poDataset->Close();
-        EXPECT_EQ(Judge(fileName).moComplaints + Judge(fileName, 1).moComplaints, "");
-        Bytes oExpected(80 * 70 * 6, 0), oThird(40 * 35 * 2);
-        for (std::size_t nAt = 0; nAt < 80 * 70; ++nAt)
-        {
-            std::memcpy(&oExpected[nAt * 6], &oPixels[nAt * 6], 2);
-            std::memcpy(&oExpected[nAt * 6 + 2], &oPixels[nAt * 6 + 4], 2);
-        }
-        for (std::size_t nAt = 0; nAt < 40 * 35; ++nAt)
-            std::memcpy(&oThird[nAt * 2], &oLevel[nAt * 6 + 4], 2);
-        EXPECT_TRUE(Judge(fileName).moPixels == oExpected);
-        const TifPointer poRead = OpenTif(fileName);
-        EXPECT_EQ(poRead->ReadAuxiliaryData().GetChannelDescription(2), "third");
-        EXPECT_EQ(poRead->GetBitmapList(), std::vector<unsigned int>{nBitmap});
-        poLevels.reset(poRead->GetOverviewManager());
-        ASSERT_EQ(poLevels->GetLevels(), (std::vector<unsigned int>{2, 4}));
-        EXPECT_TRUE(poLevels->IsValid(2, 2));
-        EXPECT_FALSE(poLevels->IsValid(3, 2)) << "nothing was made of the new channel";
-        EXPECT_TRUE(ReadAll(*IOPointer(poLevels->GetOverviewIO(2, {2})), 2) == oThird);
-        std::filesystem::remove(fileName);
-    }
 }
 
 } // namespace
