@@ -1,14 +1,11 @@
-// Masks from polygons, from values and from bitmaps, each beside a decision pixel by pixel.
-#include "datasources/maskbuilder/bitmapmaskbuilder.h"
+// Masks from polygons and from values, each beside a decision pixel by pixel.
 #include "datasources/maskbuilder/polygonmaskbuilder.h"
 #include "fuzz/support/choices.h"
 #include "gobs/mask/exactmaskdecision.h"
 #include "gobs/mask/mask.h"
 #include "gobs/raster/raster.h"
 #include "tests/support/conversionmodel.h"
-#include "tests/support/syntheticdataset.h"
 #include "toolkit/core/gglshape.h"
-#include "tools/conformance/referenceimage.h"
 
 #include <memory>
 #include <set>
@@ -334,31 +331,6 @@ void TryValues(Choices& oChoices)
     }
 }
 
-void TryBitmaps(Choices& oChoices)
-{
-    const auto oModel = std::make_shared<krv::test::ImageModel>();
-    oModel->mnWidth = 1 + oChoices.Below(40);
-    oModel->mnHeight = 1 + oChoices.Below(30);
-    oModel->moBitmaps = {{1, ""}, {4, "zone"}};
-    krv::test::SyntheticDataset oDataset(oModel);
-    const unsigned int nBitmap = oChoices.OneIn(2) ? 4 : 1;
-    const krv::datasources::BitmapMaskBuilder oBuilder(&oDataset, nBitmap, false);
-    const krv::conformance::ReferenceImage oImage{oModel->mnWidth, oModel->mnHeight, 1,
-                                                  krv::test::BitmapImage(*oModel, {nBitmap})};
-    const unsigned int nX = oChoices.Below(oImage.mnWidth), nY = oChoices.Below(oImage.mnHeight);
-    const RasterInfo oInfo(1 + oChoices.Below(oImage.mnWidth - nX), 1 + oChoices.Below(oImage.mnHeight - nY), 3,
-                           eDT_64R);
-    const RasterContext oContext(static_cast<int>(nX), static_cast<int>(nY), oChoices.Below(oImage.mnWidth / 2 + 1),
-                                 oChoices.Below(oImage.mnHeight / 2 + 1));
-    const std::unique_ptr<Mask> oMask(oBuilder.BuildMask(oInfo, oContext));
-    CheckMask(*oMask);
-    const std::string oExpected = oImage.WithMargins(nX, nY, oInfo.GetWidth(), oInfo.GetHeight(), oContext.GetXMargin(),
-                                                     oContext.GetYMargin(), eMirror);
-    for (std::size_t i = 0; i < oExpected.size(); ++i)
-        if (((oMask->GetBits()[i / 8] & 128 >> i % 8) != 0) != (oExpected[i] != 0))
-            Check(false, "bitmap, index " + std::to_string(i));
-}
-
 } // namespace
 
 extern "C" int LLVMFuzzerInitialize(int*, char***)
@@ -369,17 +341,9 @@ extern "C" int LLVMFuzzerInitialize(int*, char***)
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* poBytes, std::size_t nBytes)
 {
     Choices oChoices(poBytes, nBytes);
-    switch (oChoices.Below(5))
-    {
-    case 0:
-        TryBitmaps(oChoices);
-        break;
-    case 1:
-    case 2:
+    if (oChoices.OneIn(2))
         TryPolygons(oChoices);
-        break;
-    default:
+    else
         TryValues(oChoices);
-    }
     return 0;
 }

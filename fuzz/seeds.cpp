@@ -15,42 +15,11 @@
 namespace
 {
 
-void WriteLayouts(const std::filesystem::path& oFolder)
-{
-    struct Sample
-    {
-        std::uint16_t mnBits;
-        std::uint16_t mnFormat;
-    };
-    constexpr Sample SAMPLES[] = {{8, 1}, {16, 1}, {32, 3}, {32, 5}};
-    constexpr std::uint16_t CODECS[] = {COMPRESSION_NONE, COMPRESSION_ADOBE_DEFLATE, COMPRESSION_LZW, COMPRESSION_ZSTD,
-                                        COMPRESSION_PACKBITS};
-    unsigned int nSeed = 0;
-    for (const Sample& oSample : SAMPLES)
-        for (const std::uint16_t nCodec : CODECS)
-            for (const char* pMode : {"wl", "wb8"})
-            {
-                const std::string name = "seed_" + std::to_string(++nSeed) + ".tif";
-                const auto oFile = krv::test::NewTiff((oFolder / name).string(), pMode);
-                krv::test::TiffForm oForm{37, 29, 2, oSample.mnBits, oSample.mnFormat, nCodec};
-                oForm.mbSeparate = nSeed % 3 == 0;
-                oForm.mnTileWidth = nSeed % 4 < 2 ? 0 : 16;
-                for (const std::uint32_t nReduced : {0, FILETYPE_REDUCEDIMAGE})
-                {
-                    SetForm(oFile.get(), oForm);
-                    TIFFSetField(oFile.get(), TIFFTAG_SUBFILETYPE, nReduced);
-                    krv::test::WriteBlocks(oFile.get());
-                    TIFFWriteDirectory(oFile.get());
-                    oForm.mnWidth = 19;
-                    oForm.mnHeight = 15;
-                }
-            }
-}
-
 // An image with a level below it, a mask and a palette, in several codecs.
 void WritePages(const std::filesystem::path& oFolder)
 {
-    for (const std::uint16_t nCodec : {COMPRESSION_NONE, COMPRESSION_LZW, COMPRESSION_JPEG, COMPRESSION_PACKBITS})
+    for (const std::uint16_t nCodec : {COMPRESSION_NONE, COMPRESSION_ADOBE_DEFLATE, COMPRESSION_LZW, COMPRESSION_ZSTD,
+                                       COMPRESSION_PACKBITS, COMPRESSION_JPEG})
         for (const char* pMode : {"wl", "wb", "wb8"})
         {
             const std::string name = "pages_" + std::to_string(nCodec) + pMode + ".tif";
@@ -115,7 +84,6 @@ try
     }
     const std::filesystem::path oFolder = pArguments[1];
     std::filesystem::create_directories(oFolder / "tif");
-    WriteLayouts(oFolder / "tif");
     std::filesystem::create_directories(oFolder / "update");
     WritePages(oFolder / "tif");
     WriteUpdates(oFolder / "tif", oFolder / "update");

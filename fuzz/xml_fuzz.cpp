@@ -1,6 +1,5 @@
-// Any bytes as an XML document: as metadata, as a format's description, and as the registry of formats.
+// Any bytes as an XML document: as metadata and as the registry of formats.
 #include "datasources/iomanager/datasetmanager.h"
-#include "datasources/iomanager/formatcapabilities.h"
 #include "fuzz/support/inputfile.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
@@ -82,17 +81,6 @@ void TryDocument(const char* pBytes, std::size_t nBytes)
     }
 }
 
-void TryDescription(const char* pBytes, std::size_t nBytes)
-{
-    constexpr char REGISTRY[] = "<Formats><Format>input.xml</Format></Formats>";
-    WriteFormatFile("availableformats.xml", REGISTRY, sizeof REGISTRY - 1);
-    WriteFormatFile("input.xml", pBytes, nBytes);
-    StartManager();
-    const krv::datasources::FormatCapabilities oCapabilities((Home() / "etc/qrfformats/input.xml").string());
-    oCapabilities.IsSupported(krv::datasources::CAPABILITY_CREATE);
-    oCapabilities.GetLimit("/Format/Capabilities/Dataset/MaxChannels");
-}
-
 void TryRegistry(const char* pBytes, std::size_t nBytes)
 {
     WriteFormatFile("availableformats.xml", pBytes, nBytes);
@@ -114,7 +102,6 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* poBytes, std::size_t n
     const char* const pText = reinterpret_cast<const char*>(poBytes);
     TryTree(pText, nBytes);
     TryDocument(pText, nBytes);
-    TryDescription(pText, nBytes);
     TryRegistry(pText, nBytes);
     return 0;
 }

@@ -90,17 +90,6 @@ TEST(FillRasterMarginsTest, EveryBehaviourSideAndPixelSizeLikeTheNaiveModel)
                 }
 }
 
-TEST(FillRasterMarginsTest, MarginsWiderThanOneBatchOfColumns)
-{
-    Raster oRaster(RasterInfo(3, 2, 1, DataType(eDT_16U)), RasterContext(0, 0, 700, 1));
-    auto* pValues = reinterpret_cast<unsigned short*>(oRaster.GetBuffer());
-    for (std::uint64_t i = 0; i < oRaster.GetBufferSize() / 2; ++i)
-        pValues[i] = static_cast<unsigned short>(i);
-    const std::vector<std::string> oBefore = Pixels(oRaster);
-    FillRasterMargins(&oRaster, eMirror, 15);
-    ExpectFilled(oBefore, oRaster, eMirror, 15, "wide margins");
-}
-
 TEST(FillRasterMarginsTest, RefusesWhatItCannotMake)
 {
     Raster oRaster(RasterInfo(2, 2, 1, DataType(eDT_8U)), RasterContext(0, 0, 1, 1));

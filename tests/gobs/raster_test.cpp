@@ -35,19 +35,6 @@ TEST(RasterTest, HugeExtentsAreCountedNotWrapped)
     EXPECT_THROW(Raster(oHuge, RasterContext(), static_cast<unsigned char*>(HMalloc(100000)), true), DataException);
 }
 
-TEST(RasterTest, OwnershipFollowsTheFlag)
-{
-    const RasterInfo oInfo(4, 4, 1, DataType(eDT_8U));
-    auto* pBuffer = static_cast<unsigned char*>(HMalloc(16));
-    {
-        const Raster oBorrowing(oInfo, RasterContext(), pBuffer, false);
-        EXPECT_EQ(oBorrowing.GetBuffer(), pBuffer);
-    }
-    std::memset(pBuffer, 7, 16);
-    const Raster oOwning(oInfo, RasterContext(), pBuffer, true);
-    EXPECT_EQ(oOwning.GetBuffer()[15], 7);
-}
-
 TEST(RasterTest, NullBufferIsRefusedAtItsPlace)
 {
     const auto oError = test::Thrown<DataException>(

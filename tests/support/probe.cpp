@@ -9,6 +9,7 @@
 #include "datasources/metadata/auxiliarydata.h"
 #include "toolkit/exceptions/exceptions.h"
 
+#include <source_location>
 #include <stdexcept>
 #include <utility>
 
@@ -62,9 +63,9 @@ protected:
     {
     }
 
-    Interface& Inner(const char* pCall) const
+    Interface& Inner(std::source_location oCall = std::source_location::current()) const
     {
-        moProbe.Enter(pCall);
+        moProbe.Enter(oCall.function_name());
         return *mpoInner;
     }
 
@@ -97,28 +98,28 @@ public:
     {
     }
 
-    unsigned int GetFileWidth() const override { return Inner("IO::GetFileWidth").GetFileWidth(); }
-    unsigned int GetFileHeight() const override { return Inner("IO::GetFileHeight").GetFileHeight(); }
-    unsigned int GetTileWidth() const override { return Inner("IO::GetTileWidth").GetTileWidth(); }
-    unsigned int GetTileHeight() const override { return Inner("IO::GetTileHeight").GetTileHeight(); }
+    unsigned int GetFileWidth() const override { return Inner().GetFileWidth(); }
+    unsigned int GetFileHeight() const override { return Inner().GetFileHeight(); }
+    unsigned int GetTileWidth() const override { return Inner().GetTileWidth(); }
+    unsigned int GetTileHeight() const override { return Inner().GetTileHeight(); }
     void ReadWindow(int nX, int nY, unsigned int nW, unsigned int nH, unsigned int nPartX, unsigned int nPartY,
                     unsigned int nPartW, unsigned int nPartH, unsigned char* pBuffer) override
     {
-        Inner("IO::ReadWindow/long").ReadWindow(nX, nY, nW, nH, nPartX, nPartY, nPartW, nPartH, pBuffer);
+        Inner().ReadWindow(nX, nY, nW, nH, nPartX, nPartY, nPartW, nPartH, pBuffer);
     }
     void ReadWindow(unsigned int nX, unsigned int nY, unsigned int nW, unsigned int nH, unsigned char* pBuffer) override
     {
-        Inner("IO::ReadWindow/short").ReadWindow(nX, nY, nW, nH, pBuffer);
+        Inner().ReadWindow(nX, nY, nW, nH, pBuffer);
     }
     void WriteWindow(int nX, int nY, unsigned int nW, unsigned int nH, unsigned int nPartX, unsigned int nPartY,
                      unsigned int nPartW, unsigned int nPartH, unsigned char* const pBuffer) override
     {
-        Inner("IO::WriteWindow/long").WriteWindow(nX, nY, nW, nH, nPartX, nPartY, nPartW, nPartH, pBuffer);
+        Inner().WriteWindow(nX, nY, nW, nH, nPartX, nPartY, nPartW, nPartH, pBuffer);
     }
     void WriteWindow(unsigned int nX, unsigned int nY, unsigned int nW, unsigned int nH,
                      unsigned char* const pBuffer) override
     {
-        Inner("IO::WriteWindow/short").WriteWindow(nX, nY, nW, nH, pBuffer);
+        Inner().WriteWindow(nX, nY, nW, nH, pBuffer);
     }
 };
 
@@ -126,7 +127,7 @@ class ProbedLevelIO : public ProbedIO<IOverviewIO>
 {
 public:
     using ProbedIO::ProbedIO;
-    unsigned int GetLevel() const override { return Inner("IO::GetLevel").GetLevel(); }
+    unsigned int GetLevel() const override { return Inner().GetLevel(); }
 };
 
 class ProbedChannelInfo : public Decorator<IChannelInfo>
@@ -134,12 +135,9 @@ class ProbedChannelInfo : public Decorator<IChannelInfo>
 public:
     ProbedChannelInfo(Probe& oProbe, IChannelInfo* poInner) : Decorator(oProbe, poInner, Probe::eOther) {}
 
-    const krv::gobs::DataType& GetNativeDataType() const override { return Inner("Info::Native").GetNativeDataType(); }
-    const krv::gobs::DataType& GetDataType() const override { return Inner("Info::GetDataType").GetDataType(); }
-    const krv::gobs::DataTypeConstraints& GetConstraints() const override
-    {
-        return Inner("Info::GetConstraints").GetConstraints();
-    }
+    const krv::gobs::DataType& GetNativeDataType() const override { return Inner().GetNativeDataType(); }
+    const krv::gobs::DataType& GetDataType() const override { return Inner().GetDataType(); }
+    const krv::gobs::DataTypeConstraints& GetConstraints() const override { return Inner().GetConstraints(); }
 };
 
 class ProbedManager : public Decorator<IOverviewManager>
@@ -147,38 +145,26 @@ class ProbedManager : public Decorator<IOverviewManager>
 public:
     ProbedManager(Probe& oProbe, IOverviewManager* poInner) : Decorator(oProbe, poInner, Probe::eOther) {}
 
-    std::vector<unsigned int> GetLevels() const override { return Inner("Manager::GetLevels").GetLevels(); }
+    std::vector<unsigned int> GetLevels() const override { return Inner().GetLevels(); }
     IRasterIO* GetOverviewIO(unsigned int nLevel, const std::vector<unsigned int>& oChannels) override
     {
-        return Wrap<ProbedLevelIO>(Inner("Manager::GetOverviewIO").GetOverviewIO(nLevel, oChannels));
+        return Wrap<ProbedLevelIO>(Inner().GetOverviewIO(nLevel, oChannels));
     }
-    void CreateLevel(unsigned int nLevel) override { Inner("Manager::CreateLevel").CreateLevel(nLevel); }
+    void CreateLevel(unsigned int nLevel) override { Inner().CreateLevel(nLevel); }
     bool IsValid(unsigned int nChannel, unsigned int nLevel) const override
     {
-        return Inner("Manager::IsValid").IsValid(nChannel, nLevel);
+        return Inner().IsValid(nChannel, nLevel);
     }
-    void DeleteLevel(unsigned int nLevel) override { Inner("Manager::DeleteLevel").DeleteLevel(nLevel); }
-    std::string GetResamplingName() const override { return Inner("Manager::GetResampling").GetResamplingName(); }
+    void DeleteLevel(unsigned int nLevel) override { Inner().DeleteLevel(nLevel); }
+    std::string GetResamplingName() const override { return Inner().GetResamplingName(); }
     void SetValid(unsigned int nChannel, unsigned int nLevel, bool bValid) override
     {
-        Inner("Manager::SetValid").SetValid(nChannel, nLevel, bValid);
+        Inner().SetValid(nChannel, nLevel, bValid);
     }
-    unsigned int GetLevelWidth(unsigned int nLevel) const override
-    {
-        return Inner("Manager::Width").GetLevelWidth(nLevel);
-    }
-    unsigned int GetLevelHeight(unsigned int nLevel) const override
-    {
-        return Inner("Manager::Height").GetLevelHeight(nLevel);
-    }
-    AuxiliaryData GetAuxiliaryData(unsigned int nLevel) override
-    {
-        return Inner("Manager::GetAuxiliaryData").GetAuxiliaryData(nLevel);
-    }
-    void SetResamplingName(const std::string& oName) override
-    {
-        Inner("Manager::SetResampling").SetResamplingName(oName);
-    }
+    unsigned int GetLevelWidth(unsigned int nLevel) const override { return Inner().GetLevelWidth(nLevel); }
+    unsigned int GetLevelHeight(unsigned int nLevel) const override { return Inner().GetLevelHeight(nLevel); }
+    AuxiliaryData GetAuxiliaryData(unsigned int nLevel) override { return Inner().GetAuxiliaryData(nLevel); }
+    void SetResamplingName(const std::string& oName) override { Inner().SetResamplingName(oName); }
 };
 
 class ProbedDataset : public Decorator<IDataset>, public IRasterDataset, public IGeocodedDataset, public IBitmapDataset
@@ -190,52 +176,40 @@ public:
     {
     }
 
-    IFileFormat* GetFileFormat() const override { return Inner("Dataset::GetFileFormat").GetFileFormat(); }
-    FileAccessState Delete() override { return Inner("Dataset::Delete").Delete(); }
-    bool Exists() const override { return Inner("Dataset::Exists").Exists(); }
-    std::string GetName() override { return Inner("Dataset::GetName").GetName(); }
-    AuxiliaryData ReadAuxiliaryData() override { return Inner("Dataset::ReadAuxiliaryData").ReadAuxiliaryData(); }
-    void WriteAuxiliaryData(const AuxiliaryData& oData) override
-    {
-        Inner("Dataset::WriteAuxiliaryData").WriteAuxiliaryData(oData);
-    }
-    krv::ogc::cs::ICRS* ReadCRS() const override { return Inner("Dataset::ReadCRS").ReadCRS(); }
-    void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override { Inner("Dataset::UpdateCRS").UpdateCRS(oCRS); }
-    bool IsLinked() const override { return Inner("Dataset::IsLinked").IsLinked(); }
-    void Synchronize() override { Inner("Dataset::Synchronize").Synchronize(); }
-    bool IsOpen() const override { return Inner("Dataset::IsOpen").IsOpen(); }
-    void Close() override { Inner("Dataset::Close").Close(); }
+    IFileFormat* GetFileFormat() const override { return Inner().GetFileFormat(); }
+    FileAccessState Delete() override { return Inner().Delete(); }
+    bool Exists() const override { return Inner().Exists(); }
+    std::string GetName() override { return Inner().GetName(); }
+    AuxiliaryData ReadAuxiliaryData() override { return Inner().ReadAuxiliaryData(); }
+    void WriteAuxiliaryData(const AuxiliaryData& oData) override { Inner().WriteAuxiliaryData(oData); }
+    krv::ogc::cs::ICRS* ReadCRS() const override { return Inner().ReadCRS(); }
+    void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override { Inner().UpdateCRS(oCRS); }
+    bool IsLinked() const override { return Inner().IsLinked(); }
+    void Synchronize() override { Inner().Synchronize(); }
+    bool IsOpen() const override { return Inner().IsOpen(); }
+    void Close() override { Inner().Close(); }
 
     IRasterIO* GetRasterIO(const std::vector<unsigned int>& oChannels) override
     {
-        return Wrap<ProbedIO<IRasterIO>>(Raster("Raster::GetRasterIO").GetRasterIO(oChannels));
+        return Wrap<ProbedIO<IRasterIO>>(Raster().GetRasterIO(oChannels));
     }
-    void AddNewChannel(const krv::gobs::RasterInfo& oInfo) override { Raster("Raster::Add").AddNewChannel(oInfo); }
-    void DeleteChannel(unsigned int nChannel) override { Raster("Raster::DeleteChannel").DeleteChannel(nChannel); }
+    void AddNewChannel(const krv::gobs::RasterInfo& oInfo) override { Raster().AddNewChannel(oInfo); }
+    void DeleteChannel(unsigned int nChannel) override { Raster().DeleteChannel(nChannel); }
     void Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes) override
     {
-        Raster("Raster::Create").Create(nWidth, nHeight, oTypes);
+        Raster().Create(nWidth, nHeight, oTypes);
     }
-    void Create(const krv::gobs::RasterInfo& oInfo) override { Raster("Raster::Create").Create(oInfo); }
-    unsigned int GetWidth() const override { return Raster("Raster::GetWidth").GetWidth(); }
-    unsigned int GetHeight() const override { return Raster("Raster::GetHeight").GetHeight(); }
-    unsigned int GetChanCount() const override { return Raster("Raster::GetChanCount").GetChanCount(); }
+    void Create(const krv::gobs::RasterInfo& oInfo) override { Raster().Create(oInfo); }
+    unsigned int GetWidth() const override { return Raster().GetWidth(); }
+    unsigned int GetHeight() const override { return Raster().GetHeight(); }
+    unsigned int GetChanCount() const override { return Raster().GetChanCount(); }
     IChannelInfo* GetChannelInfo(unsigned int nChannel) const override
     {
-        return Wrap<ProbedChannelInfo>(Raster("Raster::GetChannelInfo").GetChannelInfo(nChannel));
+        return Wrap<ProbedChannelInfo>(Raster().GetChannelInfo(nChannel));
     }
-    IHistoryIO* GetHistoryIO(unsigned int nChannel) override
-    {
-        return Raster("Raster::GetHistoryIO").GetHistoryIO(nChannel);
-    }
-    IOverviewManager* GetOverviewManager() override
-    {
-        return Wrap<ProbedManager>(Raster("Raster::GetOverviewManager").GetOverviewManager());
-    }
-    AccessCapabilities GetRasterCapabilities() override
-    {
-        return Raster("Raster::Capabilities").GetRasterCapabilities();
-    }
+    IHistoryIO* GetHistoryIO(unsigned int nChannel) override { return Raster().GetHistoryIO(nChannel); }
+    IOverviewManager* GetOverviewManager() override { return Wrap<ProbedManager>(Raster().GetOverviewManager()); }
+    AccessCapabilities GetRasterCapabilities() override { return Raster().GetRasterCapabilities(); }
 
     const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override
     {
@@ -248,32 +222,29 @@ public:
         Facet(mpoGeocoded).SetGeocoding(oInfo);
     }
 
-    std::vector<unsigned int> GetBitmapList() const override { return Bitmaps("Bitmap::GetList").GetBitmapList(); }
+    std::vector<unsigned int> GetBitmapList() const override { return Bitmaps().GetBitmapList(); }
     IRasterIO* GetBitmapIO(const std::vector<unsigned int>& oBitmaps) override
     {
-        return Wrap<ProbedIO<IRasterIO>>(Bitmaps("Bitmap::GetBitmapIO").GetBitmapIO(oBitmaps));
+        return Wrap<ProbedIO<IRasterIO>>(Bitmaps().GetBitmapIO(oBitmaps));
     }
-    void DeleteBitmap(unsigned int nBitmap) override { Bitmaps("Bitmap::Delete").DeleteBitmap(nBitmap); }
-    unsigned int CreateBitmap() override { return Bitmaps("Bitmap::Create").CreateBitmap(); }
+    void DeleteBitmap(unsigned int nBitmap) override { Bitmaps().DeleteBitmap(nBitmap); }
+    unsigned int CreateBitmap() override { return Bitmaps().CreateBitmap(); }
     std::string GetBitmapDescription(unsigned int nBitmap) const override
     {
-        return Bitmaps("Bitmap::GetDescription").GetBitmapDescription(nBitmap);
+        return Bitmaps().GetBitmapDescription(nBitmap);
     }
     void SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription) override
     {
-        Bitmaps("Bitmap::SetDescription").SetBitmapDescription(nBitmap, oDescription);
+        Bitmaps().SetBitmapDescription(nBitmap, oDescription);
     }
-    MetadataMap GetBitmapMetadata(unsigned int nBitmap) const override
-    {
-        return Bitmaps("Bitmap::GetMetadata").GetBitmapMetadata(nBitmap);
-    }
+    MetadataMap GetBitmapMetadata(unsigned int nBitmap) const override { return Bitmaps().GetBitmapMetadata(nBitmap); }
     void SetBitmapMetadata(unsigned int nBitmap, const MetadataMap& oMetadata) override
     {
-        Bitmaps("Bitmap::SetMetadata").SetBitmapMetadata(nBitmap, oMetadata);
+        Bitmaps().SetBitmapMetadata(nBitmap, oMetadata);
     }
     IOverviewManager* GetBitmapOverviewManager() override
     {
-        return Wrap<ProbedManager>(Bitmaps("Bitmap::GetManager").GetBitmapOverviewManager());
+        return Wrap<ProbedManager>(Bitmaps().GetBitmapOverviewManager());
     }
 
 private:
@@ -285,14 +256,14 @@ private:
         return *poFacet;
     }
 
-    IRasterDataset& Raster(const char* pCall) const
+    IRasterDataset& Raster(std::source_location oCall = std::source_location::current()) const
     {
-        moProbe.Enter(pCall);
+        moProbe.Enter(oCall.function_name());
         return Facet(mpoRaster);
     }
-    IBitmapDataset& Bitmaps(const char* pCall) const
+    IBitmapDataset& Bitmaps(std::source_location oCall = std::source_location::current()) const
     {
-        moProbe.Enter(pCall);
+        moProbe.Enter(oCall.function_name());
         return Facet(mpoBitmaps);
     }
 

@@ -10,7 +10,6 @@
 #include "tests/support/demofile.h"
 #include "tests/support/facts.h"
 #include "tests/support/pixels.h"
-#include "tests/support/recipe.h"
 #include "tests/tools/programrun.h"
 #include "toolkit/ogc/cs/coordinatetransformation.h"
 #include "toolkit/ogc/cs/crsfactory.h"
@@ -217,29 +216,6 @@ TEST_F(MaskCommand, NoDataIsStoredAsItsComplement)
     EXPECT_EQ(oBitmaps[0]["description"], "Bitmap 1");
     EXPECT_EQ(oBitmaps[1]["validity"], true);
     EXPECT_EQ(RunKrv({"stats", moFile, "--json"}).Json()["channels"][0]["valid"], 0) << "no-data alone is set there";
-
-    // Channels of several types, each with the value in its own type.
-    const std::string mixed = moFolder.File("mixed.demo");
-    const std::vector<krv::gobs::DataType> oTypes{krv::gobs::eDT_8U, krv::gobs::eDT_16U, krv::gobs::eDT_8U};
-    const std::string first = krv::test::RecipeImage(40, 30, {1}, oTypes[0]);
-    const int nValue = static_cast<unsigned char>(first[77]);
-    krv::datasources::MetadataMap oTags;
-    oTags["NO_DATA_VALUE"] = std::to_string(nValue);
-    krv::test::WriteDemoFile(mixed, 40, 30, oTypes, oTags);
-    const std::string second = krv::test::RecipeImage(40, 30, {2}, oTypes[1]);
-    const std::string third = krv::test::RecipeImage(40, 30, {3}, oTypes[2]);
-    int nAny = 0, nAll = 0;
-    for (std::size_t i = 0; i < first.size(); ++i)
-    {
-        const bool a = static_cast<unsigned char>(first[i]) == nValue,
-                   c = static_cast<unsigned char>(third[i]) == nValue;
-        const bool b = static_cast<unsigned char>(second[2 * i]) == nValue && second[2 * i + 1] == 0;
-        nAny += a || b || c ? 1 : 0;
-        nAll += a && b && c ? 1 : 0;
-    }
-    EXPECT_GT(nAny, 0);
-    EXPECT_EQ(RunKrv({"mask", mixed, "--no-data", "--json"}).Json()["set"], nAny);
-    EXPECT_EQ(RunKrv({"mask", mixed, "--no-data", "--rule", "all", "--json"}).Json()["set"], nAll);
 }
 
 TEST_F(MaskCommand, FailuresSayWhyOnOneLineAndChangeNothing)

@@ -62,33 +62,6 @@ TEST(OverviewsVerb, LevelsAreThereForLibtiffToo)
         ASSERT_EQ(oRow[nX], nX + 20 + nX % 2) << nX; // halves to the even side
 }
 
-// Codecs that are only read: the levels get another one.
-TEST(OverviewsVerb, FilesOfEveryCodecGetLevels)
-{
-    const TempFolder oFolder;
-    for (const int nCodec : {COMPRESSION_LERC, COMPRESSION_WEBP, COMPRESSION_CCITTFAX4})
-    {
-        const bool bFax = nCodec == COMPRESSION_CCITTFAX4;
-        const std::string file = oFolder.File(std::to_string(nCodec) + ".tif");
-        {
-            const krv::test::TiffFile oTiff = krv::test::NewTiff(file);
-            krv::test::SetForm(oTiff.get(), {.mnWidth = 300,
-                                             .mnHeight = 300,
-                                             .mnChannels = static_cast<std::uint16_t>(bFax ? 1 : 3),
-                                             .mnBits = static_cast<std::uint16_t>(bFax ? 1 : 8),
-                                             .mnCompression = static_cast<std::uint16_t>(nCodec)});
-            krv::test::WriteBlocks(oTiff.get());
-        }
-        const ProgramRun oRun = RunKrv({"overviews", file, "--levels", "2", "--resampling", "nearest"});
-        ASSERT_EQ(oRun.code, 0) << oRun.errors;
-        const krv::test::TiffFile oTiff(TIFFOpen(file.c_str(), "r"));
-        ASSERT_EQ(TIFFSetDirectory(oTiff.get(), 1), 1);
-        std::uint16_t nUsed = 0;
-        TIFFGetField(oTiff.get(), TIFFTAG_COMPRESSION, &nUsed);
-        EXPECT_EQ(nUsed, COMPRESSION_ADOBE_DEFLATE) << nCodec;
-    }
-}
-
 TEST(OverviewsVerb, RefusalsLeaveTheFileAsItIs)
 {
     const TempFolder oFolder;

@@ -276,17 +276,6 @@ TEST(Command, SpoiltPartsAreNamedAndTheRestIsShown)
     }
 }
 
-TEST(Command, StopsCleanlyWhenInterrupted)
-{
-    const TempFolder oFolder;
-    const std::string file = oFolder.File("vast.tif"), target = oFolder.File("vast.png");
-    WriteSparse(file, 200000, "vast");
-    const auto oRun = RunProgram(KRV_PROGRAM, {"view", file, target}, {}, 700);
-    EXPECT_EQ(oRun.code, 1);
-    EXPECT_EQ(oRun.errors, "krv: stopped\n");
-    EXPECT_FALSE(std::filesystem::exists(target));
-}
-
 } // namespace
 
 } // namespace krv::tool

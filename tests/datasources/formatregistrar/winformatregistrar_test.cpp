@@ -1,10 +1,7 @@
 #include "datasources/formatregistrar/winformatregistrar.h"
 
-#include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/iomanager/datasetmanager.h"
-#include "datasources/reader/basicreader.h"
-#include "gobs/raster/raster.h"
 #include "tests/support/outputcapture.h"
 #include "tests/support/thrown.h"
 #include "toolkit/core/core.h"
@@ -20,7 +17,6 @@
 
 using namespace krv::datasources;
 using krv::conformance::FormatHome;
-using krv::test::Error;
 using krv::test::Thrown;
 
 namespace
@@ -222,34 +218,4 @@ TEST(FormatRegistrar, MissingAndUnusableLibrariesDifferInTheErrorNumber)
         EXPECT_EQ(IMPOpenLibrary(pName), nullptr);
         EXPECT_EQ(errno, nError) << pName << IMPLibraryError();
     }
-}
-
-// Datasets of a library that go wrong in every way: an exception or a plain answer, no crash.
-TEST(FormatRegistrar, WaywardDatasets)
-{
-    FormatHome oHome;
-    oHome.Add(Plugin("wayward"));
-    const auto Open = [&](const std::string& fault)
-    {
-        const std::string name = oHome.GetFolder().Write("file.way", "WAYWARD " + fault);
-        std::string error = Error([&] { std::unique_ptr<krv::gobs::Raster>(BasicReader(name).GetRaster(0)); });
-        const std::size_t nFile = error.find(name);
-        return nFile == std::string::npos ? error : error.replace(nFile, name.size(), "FILE");
-    };
-    const std::pair<const char*, const char*> EXPECTED[] = {
-        {"good", ""},
-        {"identify", "foreign"},
-        {"open", "foreign"},
-        {"null", "data: Format does not support rasters: file=FILE"},
-        {"noraster", "data: Format does not support rasters: file=FILE"},
-        {"nochannels", "data: No channels in dataset: file=FILE"},
-        {"nopixels", "bounds: There is no tile 0: the image has 0"},
-        {"toomanychannels", "data: synthetic: no channel 4"},
-        {"nullinfo", "data: The dataset gave no description of channel 1"},
-        {"nullio", "data: The dataset gave no raster I/O for the channels"},
-        {"huge", "data: A buffer of 4294967295 x 4294967295 pixels, 3 channels of type 16U is too large"},
-        {"bits", "data: Channel 1 is of the type BIT, which no I/O hands out"},
-    };
-    for (const auto& [pFault, pExpected] : EXPECTED)
-        EXPECT_EQ(Open(pFault), pExpected) << pFault;
 }

@@ -172,18 +172,6 @@ TEST(AuxiliaryData, AppendMergesOrStopsAtTheFirstDuplicate)
     EXPECT_EQ(oData.GetChannelDescription(1), "description");
 }
 
-TEST(AuxiliaryData, AppendAcceptsTheChannelsOwnMap)
-{
-    AuxiliaryData oData(1);
-    oData.AppendChanMetadata(oData.GetChanMetadata(1), 1, false);
-    oData.SetChanMetadata({{"a", "1"}, {"b", "2"}}, 1);
-    const MetadataMap oBefore = oData.GetChanMetadata(1);
-    oData.AppendChanMetadata(oData.GetChanMetadata(1), 1, true);
-    EXPECT_EQ(oData.GetChanMetadata(1), oBefore);
-    EXPECT_THROW(oData.AppendChanMetadata(oData.GetChanMetadata(1), 1, false), krv::Exception);
-    EXPECT_EQ(oData.GetChanMetadata(1), oBefore);
-}
-
 TEST(AuxiliaryData, FilterTakesOutWhatItSelects)
 {
     AuxiliaryData oData(2);

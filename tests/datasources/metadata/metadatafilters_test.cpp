@@ -60,23 +60,6 @@ void ExpectLogical(const std::vector<bool>& oAnswers, bool bExpected, int nAsked
     EXPECT_EQ(ProbeFilter::snAlive, 0);
 }
 
-template <class Logical>
-void ExpectSharedChildren()
-{
-    auto oSource = std::make_unique<Logical>(new ProbeFilter(true));
-    Logical oCopy(*oSource);
-    oSource->PushBack(new ProbeFilter(true));
-    Logical oAssigned;
-    oAssigned = *oSource;
-    oSource.reset();
-    EXPECT_EQ(ProbeFilter::snAlive, 2);
-    EXPECT_TRUE(Selects(oCopy, "Key"));
-    EXPECT_TRUE(Selects(oAssigned, "Key"));
-    EXPECT_THROW(oCopy.PushBack(nullptr), krv::DataException);
-    EXPECT_THROW(Logical(static_cast<IMetadataFilter*>(nullptr)), krv::DataException);
-    EXPECT_EQ(ProbeFilter::snAlive, 2);
-}
-
 struct WildcardCase
 {
     const char* mpWildcard;
@@ -103,13 +86,6 @@ TEST(LogicalFilters, StopAtTheFirstDecidingChild)
     ExpectLogical<LogicalOrFilter>({}, false, 0);
     ExpectLogical<LogicalOrFilter>({false, false}, false, 2);
     ExpectLogical<LogicalOrFilter>({false, true, false}, true, 2);
-}
-
-TEST(LogicalFilters, CopiesShareTheChildrenUntilTheLastIsGone)
-{
-    ExpectSharedChildren<LogicalAndFilter>();
-    ExpectSharedChildren<LogicalOrFilter>();
-    EXPECT_EQ(ProbeFilter::snAlive, 0);
 }
 
 TEST(MetadataFilters, WildcardsMatchWholeKeys)

@@ -248,39 +248,17 @@ TEST_F(BasicReaderTest, AnswersFromEveryConstructor)
     }
 }
 
-TEST_F(BasicReaderTest, MarginsAreLimitedToHalfTheImage)
+TEST_F(BasicReaderTest, RefusedMarginsKeepTheOldOnesButForTheBehaviour)
 {
-    moModel->mnWidth = moModel->mnHeight = 5;
     BasicReader oReader(moFile);
-    oReader.SetMargins(2, 2, eMirror);
-    const struct
-    {
-        unsigned int mnX;
-        unsigned int mnY;
-        eMarginBehaviour meBehaviour;
-        bool mbAccepted;
-    } CASES[] = {
-        {3, 0, eMirror, false}, {0, 3, eException, false}, {3, 3, eReplicate, true},        {2, 2, eWrap, true},
-        {3, 0, eWrap, false},   {2, 3, eMirror101, false}, {1u << 31, 0, eConstant, false}, {1, 0, eException, true}};
-    for (const auto& oCase : CASES)
-    {
-        const auto Set = [&]
-        {
-            oReader.SetMargins(oCase.mnX, oCase.mnY, oCase.meBehaviour);
-        };
-        const unsigned int nFormerX = oReader.GetXMargin();
-        const unsigned int nFormerY = oReader.GetYMargin();
-        EXPECT_EQ(Error(Set), oCase.mbAccepted ? "" : "data: Margins can't be wider than half of the file");
-        EXPECT_EQ(oReader.GetXMargin(), oCase.mbAccepted ? oCase.mnX : nFormerX);
-        EXPECT_EQ(oReader.GetYMargin(), oCase.mbAccepted ? oCase.mnY : nFormerY);
-        EXPECT_EQ(oReader.GetMarginBehaviour(), oCase.meBehaviour); // stored even when refused
-    }
-    // Rasters keep the margins they were made with.
     oReader.SetMargins(1, 2, eReplicate);
     const RasterPtr oRaster(oReader.GetRaster(0));
+    EXPECT_EQ(Error([&] { oReader.SetMargins(11, 0, eWrap); }), "data: Margins can't be wider than half of the file");
+    EXPECT_EQ(oReader.GetXMargin(), 1u);
+    EXPECT_EQ(oReader.GetYMargin(), 2u);
+    EXPECT_EQ(oReader.GetMarginBehaviour(), eWrap); // stored even when refused
     oReader.SetMargins(0, 0, eReplicate);
-    EXPECT_EQ(oRaster->GetXMargin(), 1u);
-    EXPECT_EQ(oRaster->GetYMargin(), 2u);
+    EXPECT_EQ(oRaster->GetXMargin(), 1u); // as it was made
 }
 
 TEST_F(BasicReaderTest, PositionsBeyond32BitsAreRefusedBeforeReading)
@@ -389,4 +367,54 @@ TEST_F(BasicReaderTest, IteratorsStepOverTheEnd)
     EXPECT_EQ(oNothing.Begin(), oNothing.End());
     EXPECT_EQ(++oNothing.Begin(), oNothing.End());
     EXPECT_EQ(--oNothing.Begin(), oNothing.End());
+}
+
+// Claims more channels than it has.
+class TooManyChannels : public SyntheticDataset
+{
+public:
+    using SyntheticDataset::SyntheticDataset;
+    unsigned int GetChanCount() const override { return 5; }
+};
+
+// Hands out null where the contract promises an object.
+class NullInfo : public SyntheticDataset
+{
+public:
+    using SyntheticDataset::SyntheticDataset;
+    IChannelInfo* GetChannelInfo(unsigned int) const override { return nullptr; }
+};
+
+class NullIO : public SyntheticDataset
+{
+public:
+    using SyntheticDataset::SyntheticDataset;
+    IRasterIO* GetRasterIO(const std::vector<unsigned int>&) override { return nullptr; }
+};
+
+template <class Dataset>
+std::unique_ptr<IDataset> Make(const ImageModelPtr& poModel)
+{
+    return std::make_unique<Dataset>(poModel);
+}
+
+TEST_F(BasicReaderTest, DatasetsThatGoWrongEndInAnException)
+{
+    const auto ErrorOf = [this](auto pMake)
+    {
+        moMakeDataset = [=, this]
+        {
+            return pMake(moModel);
+        };
+        return Error([this] { RasterPtr(BasicReader(moFile).GetRaster(0)); });
+    };
+    EXPECT_EQ(ErrorOf(&Make<TooManyChannels>), "data: synthetic: no channel 4");
+    EXPECT_EQ(ErrorOf(&Make<NullInfo>), "data: The dataset gave no description of channel 1");
+    EXPECT_EQ(ErrorOf(&Make<NullIO>), "data: The dataset gave no raster I/O for the channels");
+    EXPECT_EQ(ErrorOf([](auto&) { return nullptr; }), "data: Format does not support rasters: file=" + moFile);
+    moModel->moTypes.assign(3, krv::gobs::eDT_BIT);
+    EXPECT_EQ(ErrorOf(&Make<SyntheticDataset>), "data: Channel 1 is of the type BIT, which no I/O hands out");
+    moModel->moTypes.assign(3, krv::gobs::eDT_8U);
+    moModel->mnWidth = moModel->mnHeight = 0;
+    EXPECT_EQ(ErrorOf(&Make<SyntheticDataset>), "bounds: There is no tile 0: the image has 0");
 }

@@ -145,19 +145,4 @@ TEST(Predictor, FloatingPointPlanesComeAndGo)
     }
 }
 
-TEST(Predictor, EmptyBlocksAreLeftAlone)
-{
-    std::vector<unsigned char> oScratch;
-    Exact oSource(Bytes(3, 1)), oResult(Bytes(3, 2));
-    for (const BlockShape& oShape :
-         {BlockShape{0, 4, 3, 2}, BlockShape{4, 0, 3, 2}, BlockShape{4, 4, 0, 2}, BlockShape{0, 4, 100, 2}})
-    {
-        UndoHorizontal(oSource.data(), 0, oResult.data(), 0, oShape);
-        ApplyHorizontal(oSource.data(), 0, oResult.data(), 0, oShape);
-        UndoFloatingPoint(oSource.data(), 0, oResult.data(), 0, oShape, oScratch);
-        ApplyFloatingPoint(oSource.data(), 0, oResult.data(), 0, oShape, oScratch);
-        EXPECT_EQ(Bytes(3, 2), oResult.ToBytes());
-    }
-}
-
 } // namespace
