@@ -1,6 +1,5 @@
 #include "datasources/metadata/displaydefaults.h"
 
-#include "datasources/metadata/auxdatadefaultrgbgtfm.h"
 #include "datasources/metadata/metadatadefaultrgbgmapper.h"
 #include "tests/datasources/metadata/groupinglocale.h"
 #include "tests/support/syntheticdataset.h"
@@ -162,26 +161,6 @@ TEST(DisplayDefaultTransformations, KeysCountInTheirExactSpellingAlone)
     const MetadataMap UNTOUCHED = {
         {"defaultred", "2"}, {"DEFAULTGREEN", "3"}, {"DefaultBlue2", "4"}, {"DefaultGrey", "4"}};
     EXPECT_EQ(oCopy.Transform(UNTOUCHED), UNTOUCHED);
-}
-
-TEST(DisplayDefaultTransformations, TheRecordKeepsItsChannelsAndIsFlagged)
-{
-    AuxiliaryData oData(2);
-    oData.SetChanMetadataValue("DefaultRed", "3", 1);
-    oData.SetChannelDescription("near infrared", 2);
-    oData.SetFileMetadataValue("DefaultRed", "3");
-    oData.SetFileMetadataValue("DefaultRed", "3");
-    ASSERT_FALSE(oData.IsModified());
-
-    krv::qrfutils::AuxDataDefaultRGBGTfm oTfm({});
-    oTfm = krv::qrfutils::AuxDataDefaultRGBGTfm(std::vector<unsigned int>{3}); // shares the mapper
-    const krv::qrfutils::AuxDataDefaultRGBGTfm oCopy(oTfm);
-    const AuxiliaryData oResult = oCopy.Transform(oData);
-    EXPECT_EQ(oResult.GetFileMetadataValue("DefaultRed"), "1");
-    EXPECT_EQ(oResult.GetChanMetadataValue("DefaultRed", 1), "3");
-    EXPECT_EQ(oResult.GetChannelDescription(2), "near infrared");
-    EXPECT_TRUE(oResult.IsModified());
-    EXPECT_EQ(oData.GetFileMetadataValue("DefaultRed"), "3");
 }
 
 } // namespace krv::datasources

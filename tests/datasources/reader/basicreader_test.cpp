@@ -211,43 +211,6 @@ TEST_F(BasicReaderTest, ExceptionsOfConstructorsNameTheirPlace)
     }
 }
 
-TEST_F(BasicReaderTest, AnswersFromEveryConstructor)
-{
-    mpoOpen = MakeDataset();
-    const std::vector<Channels> oExpected = {{1, 2, 3}, {3, 1, 2}, {1, 2, 3}, {1, 2, 3},
-                                             {7, 2},    {2, 2, 3}, {1, 2, 3}, {1, 2}};
-    std::size_t nIndex = 0;
-    for (const Constructor& oConstructor : Constructors())
-    {
-        SCOPED_TRACE(oConstructor.mpName);
-        if (mpoOpen == nullptr)
-            mpoOpen = MakeDataset();
-        const Channels& oChannels = oExpected[nIndex++];
-        const ReaderPtr oReader = oConstructor.moMake();
-        const bool bLevel = oConstructor.mpName == std::string("level");
-        const bool bBitmaps = oConstructor.mpName == std::string("bitmaps");
-        EXPECT_EQ(oReader->GetWidth(), bLevel ? 11u : 21u);
-        EXPECT_EQ(oReader->GetHeight(), bLevel ? 9u : 17u);
-        EXPECT_EQ(oReader->GetChansCount(), oChannels.size());
-        EXPECT_EQ(oReader->GetDataType(), krv::gobs::DataType(bBitmaps ? krv::gobs::eDT_8U : krv::gobs::eDT_16U));
-        ASSERT_EQ(oReader->GetChannelsInfo().size(), oChannels.size());
-        EXPECT_EQ(oReader->GetChannelsInfo().back()->GetDataType(), oReader->GetDataType());
-        EXPECT_EQ(oReader->GetTileWidth(), 8u);
-        EXPECT_EQ(oReader->GetTileHeight(), 6u);
-        EXPECT_EQ(oReader->GetTileCount(), bLevel ? 4u : 9u);
-        EXPECT_EQ(oReader->GetXMargin() + oReader->GetYMargin(), 0u);
-        EXPECT_EQ(oReader->GetMarginBehaviour(), eMirror);
-        EXPECT_EQ(oReader->GetFileFormat(), moModel->mpoFormat);
-        const bool bHasAccessor =
-            std::unique_ptr<IOverviewReaderAccessor>(oReader->GetOverviewReaderAccessor()) != nullptr;
-        EXPECT_EQ(bHasAccessor, !bLevel && !bBitmaps);
-
-        EXPECT_EQ(ReadPixels(*oReader), bLevel     ? LevelImage(*moModel, 2, oChannels)
-                                        : bBitmaps ? BitmapImage(*moModel, oChannels)
-                                                   : Image(oChannels).moBytes);
-    }
-}
-
 TEST_F(BasicReaderTest, RefusedMarginsKeepTheOldOnesButForTheBehaviour)
 {
     BasicReader oReader(moFile);

@@ -468,53 +468,6 @@ TEST(TifHostile, ChainsOfDirectoriesThatNeverEndDoNotHang)
     EXPECT_LT(Seconds() - dBegin, 2);
 }
 
-// Bytes of the process now.
-std::size_t ResidentBytes()
-{
-    std::ifstream oFile("/proc/self/statm");
-    std::size_t nTotal = 0;
-    std::size_t nResident = 0;
-    oFile >> nTotal >> nResident;
-    return nResident * 4096;
-}
-
-TEST(TifHostile, SparseGiantOpensAtOnceAndReadsAsZeros)
-{
-    const TempFolder oFolder;
-    const std::string file = oFolder.File("file.tif");
-    {
-        const TiffFile poTiff = NewTiff(file, "w8");
-        SetForm(poTiff.get(), {.mnWidth = 100000,
-                               .mnHeight = 100000,
-                               .mnCompression = COMPRESSION_ADOBE_DEFLATE,
-                               .mnRows = 256,
-                               .mnTileWidth = 256});
-        WriteBlock(poTiff.get(), 391 * 200 + 200, Bytes(256 * 256, 7));
-    }
-
-    const std::size_t nBefore = ResidentBytes();
-    const double dBegin = Seconds();
-    const TifPointer oFile = OpenTif(file);
-    const IOPointer poIO(oFile->GetRasterIO({1}));
-    EXPECT_LT(Seconds() - dBegin, 1);
-    Bytes oBuffer(272 * 272);
-    for (unsigned int nTile = 0; nTile < 1500; ++nTile)
-    {
-        std::fill(oBuffer.begin(), oBuffer.end(), static_cast<unsigned char>(1));
-        poIO->ReadWindow(static_cast<int>(nTile % 391 * 256) - 8, static_cast<int>(nTile / 391 * 256) + 248, 272, 272,
-                         8, 0, 200, 272, oBuffer.data());
-        EXPECT_EQ(oBuffer[8], 0);
-    }
-    poIO->ReadWindow(200u * 256 - 1, 200u * 256, 2u, 1u, oBuffer.data());
-    EXPECT_EQ(oBuffer[0], 0);
-    EXPECT_EQ(oBuffer[1], 7);
-#ifndef KRV_SANITIZED
-    EXPECT_LT(ResidentBytes() - nBefore, std::size_t{110} << 20);
-#else
-    EXPECT_GT(ResidentBytes(), nBefore / 2);
-#endif
-}
-
 // Some cameras and writers pad a stream before a marker.
 TEST(TifHostile, BytesBeforeAMarkerOfJpegAreNoDamage)
 {

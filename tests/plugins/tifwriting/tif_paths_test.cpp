@@ -15,11 +15,6 @@
 #include <algorithm>
 #include <cstring>
 #include <filesystem>
-#include <fstream>
-
-#include <sys/resource.h>
-#include <sys/wait.h>
-#include <unistd.h>
 
 namespace
 {
@@ -284,39 +279,6 @@ TEST(TifPaths, JpegTilesReadTheSameInAnyOrderAndAreWrittenInTheFormOfTheirPage)
     for (unsigned int nTile = 2; nTile < 4; ++nTile)
         EXPECT_TRUE(ReadTile(poAgain, nTile) == ReadTile(poInOrder, nTile)) << nTile;
 }
-
-#ifndef __SANITIZE_ADDRESS__
-// Level 9 alone would ask for a dictionary of 64 MiB, and eleven times that beside it.
-TEST(TifPaths, LzmaTakesMemoryByTheBlock)
-{
-    const TempFolder oFolder;
-    const pid_t nChild = ::fork();
-    if (nChild == 0)
-    {
-        std::ifstream oStream("/proc/self/statm");
-        std::size_t nPages = 0;
-        oStream >> nPages;
-        const rlim_t nMost = (nPages << 12U) + (rlim_t{256} << 20U);
-        const rlimit oLimit{nMost, nMost};
-        ::setrlimit(RLIMIT_AS, &oLimit);
-        try
-        {
-            const TifPointer poDataset =
-                CreateTif(oFolder.File("l.tif"), "COMPRESS=LZMA LEVEL=9", 100, 100, 1, krv::gobs::eDT_8U);
-            WriteAll(*poDataset, Bytes(100 * 100, 3));
-            poDataset->Close();
-            ::_exit(0);
-        }
-        catch (const std::exception&)
-        {
-            ::_exit(1);
-        }
-    }
-    int nStatus = 0;
-    ::waitpid(nChild, &nStatus, 0);
-    EXPECT_EQ(nStatus, 0);
-}
-#endif
 
 // Directories and their values stand before all blocks, from the image to the smallest level; blocks the other way.
 TEST(TifPaths, ACloudOptimisedFileIsInItsOrder)

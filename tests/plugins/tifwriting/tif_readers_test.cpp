@@ -144,53 +144,6 @@ TEST(TifReaders, WithoutLocksToo)
     }
 }
 
-// Processes that open, wait and read while another one writes number after number over all pixels: each finds one
-// number everywhere. What they leave is used again.
-TEST(TifReaders, ReadersInOtherProcessesSeeOneStateEach)
-{
-    const TempFolder oFolder;
-    const std::string fileName = oFolder.File("p.tif");
-    for (const char* pKind : KINDS)
-    {
-        SCOPED_TRACE(pKind);
-        CreateTif(fileName, pKind, 300, 200, 1, krv::gobs::eDT_8U)->Close();
-        std::vector<pid_t> oReaders;
-        const std::string end = oFolder.File("end");
-        for (unsigned int nReader = 0; nReader < 3; ++nReader)
-            oReaders.push_back(Start(
-                [&]
-                {
-                    std::mt19937 oRandom(nReader);
-                    while (!std::filesystem::exists(end))
-                    {
-                        const TifPointer poDataset = OpenTif(fileName);
-                        ::usleep(oRandom() % 3000);
-                        const Bytes oPixels = ReadAll(*poDataset);
-                        if (std::count(oPixels.begin(), oPixels.end(), oPixels[0]) != std::ssize(oPixels))
-                            return 1;
-                    }
-                    return 0;
-                }));
-        const TifPointer poWriter = OpenTif(fileName, eUpdate);
-        const auto Write = [&](int nStates)
-        {
-            for (int nState = 0; nState < nStates; ++nState)
-            {
-                WriteAll(*poWriter, Bytes(300 * 200, static_cast<unsigned char>(nState)));
-                poWriter->Synchronize();
-            }
-            return std::filesystem::file_size(fileName);
-        };
-        Write(150);
-        oFolder.Write("end", "");
-        for (const pid_t nReader : oReaders)
-            EXPECT_EQ(Wait(nReader), 0);
-        std::filesystem::remove(end);
-        const std::uintmax_t nBytes = Write(2);
-        EXPECT_EQ(Write(20), nBytes) << "room that nobody reads is not used again";
-    }
-}
-
 // Writes other pixels over all of a file, opened anew, and returns its size.
 std::uintmax_t Rewrite(const std::string& fileName, unsigned int nSeed)
 {
