@@ -13,7 +13,7 @@ KRV_PACKAGES_TEST=(libgtest-dev libgmock-dev)
 # What benchmarks compare with; nothing else needs them.
 KRV_PACKAGES_BENCH=(libcairo2-dev libagg-dev libvips-dev libvips-tools libtiff-tools)
 KRV_PACKAGES_FUZZ=(clang-16 libclang-rt-16-dev)
-KRV_PACKAGES_CI=(clang-format-14)
+KRV_PACKAGES_CI=(clang-format-14 clang-tidy-16)
 
 say() { printf '\n== %s\n' "$*"; }
 fail() { printf 'error: %s\n' "$*" >&2; exit 1; }
