@@ -2,11 +2,12 @@
 
 #include "datasources/interfaces/accessmode.h"
 #include "datasources/metadata/auxiliarydata.h"
+#include "datasources/metadata/typednodata.h"
 #include "gobs/raster/datatype.h"
 #include "operations/api.h"
-#include "operations/source/pixeltypes.h"
 
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -25,6 +26,9 @@ namespace krv::operations
 // Why a file cannot be opened, from the operating system: "there is no such file", "it is a folder", ... ; empty when
 // nothing stands against it.
 KRV_OPERATIONS_API std::string WhyUnreadable(const std::string& file);
+
+// A channel's no-data value, when it has one.
+using OptionalNoData = std::optional<krv::datasources::NoDataValue>;
 
 // Whether a reference in metadata means a file: it names it as the user does, or as it lies beside the one that refers
 // to it.

@@ -6,6 +6,7 @@
 #include "gobs/mask/imaskbuilder.h"
 #include "gobs/mask/mask.h"
 #include "gobs/mask/samplematch.h"
+#include "gobs/raster/pixelvalue.h"
 #include "gobs/raster/raster.h"
 
 #include <algorithm>
@@ -422,14 +423,13 @@ StatisticsGatherer::~StatisticsGatherer() = default;
 std::unique_ptr<StatisticsGatherer> StatisticsGatherer::Make(const krv::gobs::DataType& oType,
                                                              const OptionalNoData& oNoData)
 {
-    return VisitPart(oType,
-                     [&](auto nZero) -> std::unique_ptr<StatisticsGatherer>
-                     {
-                         using Part = decltype(nZero);
-                         if (oType.IsComplex())
-                             return std::make_unique<ComplexGatherer<Part>>(oNoData);
-                         return std::make_unique<RealGatherer<Part>>(oNoData);
-                     });
+    return krv::gobs::VisitPartType(oType,
+                                    [&]<class Part>(std::type_identity<Part>) -> std::unique_ptr<StatisticsGatherer>
+                                    {
+                                        if (oType.IsComplex())
+                                            return std::make_unique<ComplexGatherer<Part>>(oNoData);
+                                        return std::make_unique<RealGatherer<Part>>(oNoData);
+                                    });
 }
 
 std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile, const StatisticsRequest& oRequest,

@@ -2,8 +2,8 @@
 
 #include "datasources/reader/basicreader.h"
 #include "operations/job/exceptions.h"
+#include "tests/operations/image.h"
 #include "tests/support/recipe.h"
-#include "tests/support/syntheticdataset.h"
 
 #include <gtest/gtest.h>
 #include <zlib.h>
@@ -21,15 +21,6 @@ namespace
 
 using krv::datasources::BasicReader;
 
-// A synthetic image of channels of one type, to be cut into awkward tiles.
-std::unique_ptr<krv::datasources::IDataset> MakeImage(unsigned int nChannels, krv::gobs::NativeDataTypeCode eType)
-{
-    const auto poModel = std::make_shared<krv::test::ImageModel>();
-    poModel->moTypes.assign(nChannels, eType);
-    poModel->moAuxiliary = krv::datasources::AuxiliaryData(nChannels);
-    return std::make_unique<krv::test::SyntheticDataset>(poModel);
-}
-
 TEST(Checksums, AreThoseOfTheRowMajorPixelsWhateverTheTiles)
 {
     for (const auto eType : {krv::gobs::eDT_8U, krv::gobs::eDT_16S, krv::gobs::eDT_32R, krv::gobs::eDT_64R,
@@ -37,7 +28,7 @@ TEST(Checksums, AreThoseOfTheRowMajorPixelsWhateverTheTiles)
     {
         for (const unsigned int nChannels : {1U, 2U, 3U, 4U, 5U})
         {
-            const auto poImage = MakeImage(nChannels, eType);
+            const auto poImage = krv::test::MakeImage(nChannels, eType);
             for (const auto& [nTileWidth, nTileHeight] : {std::pair{8U, 6U}, {21U, 4U}, {1U, 1U}, {64U, 64U}})
             {
                 BasicReader oReader(poImage.get(), {}, false);
@@ -57,7 +48,7 @@ TEST(Checksums, AreThoseOfTheRowMajorPixelsWhateverTheTiles)
 
 TEST(Progress, CountsToItsTotalAndStopsTheJob)
 {
-    const auto poImage = MakeImage(1, krv::gobs::eDT_16U);
+    const auto poImage = krv::test::MakeImage(1, krv::gobs::eDT_16U);
     BasicReader oReader(poImage.get(), {}, false);
     oReader.SetTileSize(8, 6);
     std::vector<std::uint64_t> oDone;

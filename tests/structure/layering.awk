@@ -28,7 +28,8 @@ BEGIN {
     home["^(tiff|tiffio|geotiff|geo_|geokeys|geovalues|xtiffio)"] = "^(plugins/tif|tools/samplescene)/";
     home["^(libdeflate|zstd|zlib)\\.h"] = "^(plugins/support|plugins/tif|operations)/";
     home["^(CLI|nlohmann)/"] = "^tools/";
-    home["^fmt/|^png\\.h"] = "^(operations|tools)/";
+    home["^fmt/"] = "^(operations|tools)/";
+    home["^png\\.h"] = "^operations/";
     # Their traces in public headers, which everybody who includes them has to have installed.
     split("toolkit/xml/xmldocument.h toolkit/xml/xmlutil.h datasources/iomanager/xalanselect.h", names, " ");
     for (n in names)

@@ -16,13 +16,13 @@
 #include "datasources/writer/basicwriter.h"
 #include "gobs/mask/mask.h"
 #include "gobs/raster/raster.h"
+#include "operations/copy/conversion.h"
 #include "tests/support/demofile.h"
 #include "tests/support/facts.h"
 #include "tests/support/pixels.h"
 #include "tests/support/thrown.h"
 #include "tests/tools/programrun.h"
 #include "tools/conformance/tempfolder.h"
-#include "tools/krv/conversion.h"
 
 #include <gtest/gtest.h>
 
@@ -178,7 +178,7 @@ TEST(Convert, RealFilesAreStoredAsTheyWere)
         // In this process: a command for each file would take minutes.
         if (const std::string error = krv::test::Error(
                 [&] {
-                    Convert({{oRow.GetPath()}, {}, {}, {}}, {copy, "", ""});
+                    operations::Convert({{oRow.GetPath()}, {}, {}, {}}, {copy, "", ""});
                 });
             !error.empty())
         {

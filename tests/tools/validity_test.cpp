@@ -13,12 +13,12 @@
 #include "gobs/mask/mask.h"
 #include "gobs/mask/samplematch.h"
 #include "gobs/raster/raster.h"
+#include "operations/picture/reduction.h"
 #include "operations/statistics/statistics.h"
 #include "tests/support/facts.h"
 #include "tests/tools/programrun.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "tools/conformance/tempfolder.h"
-#include "tools/krv/reduction.h"
 
 #include <gtest/gtest.h>
 
@@ -106,8 +106,9 @@ void ExpectMargins(IRasterReader& oSource, const AuxiliaryData& oRecord, bool bH
 void ExpectPicture(IRasterReader& oReader, const SampleValue& oValue, const std::string& background)
 {
     operations::ProgressCounter oProgress({}, "test", 1);
-    const Plane oPlane =
-        Reduce(oReader, {oValue}, oReader.GetWidth(), oReader.GetHeight(), Reduction::eNearest, oProgress).front();
+    const operations::Plane oPlane = operations::Reduce(oReader, {oValue}, oReader.GetWidth(), oReader.GetHeight(),
+                                                        operations::Reduction::eNearest, oProgress)
+                                         .front();
     for (std::size_t n = 0; n < background.size(); ++n)
     {
         // What is not finite is not drawn either.

@@ -1,5 +1,6 @@
+#include "tools/krv/infotext.h"
+
 #include "tools/krv/errors.h"
-#include "tools/krv/fileinfo.h"
 
 #include <fmt/format.h>
 

@@ -1,6 +1,7 @@
+#include "operations/copy/conversion.h"
 #include "toolkit/exceptions/exceptions.h"
-#include "tools/krv/conversion.h"
 #include "tools/krv/errors.h"
+#include "tools/krv/progress.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -12,6 +13,8 @@
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 namespace
 {
@@ -58,7 +61,7 @@ int RunConvert(Options& oOptions)
     oRequest.promote = oOptions.type == "promoted";
     if (!oOptions.type.empty() && !oRequest.promote)
         oRequest.type = ParseType(oOptions.type);
-    Convert(oRequest, oOptions.form);
+    Convert(oRequest, oOptions.form, ShowProgress());
     return 0;
 }
 

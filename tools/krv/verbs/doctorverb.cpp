@@ -1,4 +1,4 @@
-#include "tools/krv/diagnosis.h"
+#include "operations/diagnosis/diagnosis.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/verbs/verbs.h"
@@ -11,6 +11,8 @@
 
 namespace krv::tool
 {
+
+using namespace krv::operations;
 
 namespace
 {
@@ -28,7 +30,7 @@ Json FindingToJson(const Finding& oFinding)
 {
     return {{"ok", oFinding.good},
             {"subject", oFinding.subject},
-            {"found", oFinding.found},
+            {"found", OneLine(oFinding.found)},
             {"remedy", TextOrNull(oFinding.remedy)}};
 }
 

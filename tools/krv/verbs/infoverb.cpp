@@ -1,5 +1,6 @@
+#include "operations/source/fileinfo.h"
 #include "operations/source/sourcefile.h"
-#include "tools/krv/fileinfo.h"
+#include "tools/krv/infotext.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -17,7 +18,7 @@ namespace
 int RunInfo(const std::string& file, bool bJson)
 {
     const SourceFile oFile(file);
-    const Json oInfo = GatherInfo(oFile);
+    const Json oInfo = InfoToJson(GatherInfo(oFile));
     Print(bJson ? ToText(oInfo) : InfoText(oInfo));
     return 0;
 }

@@ -1,6 +1,9 @@
+#include "operations/masking/masking.h"
+#include "operations/source/sourcefile.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
-#include "tools/krv/masking.h"
+#include "tools/krv/polygonarguments.h"
+#include "tools/krv/progress.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -14,12 +17,15 @@
 namespace krv::tool
 {
 
+using namespace krv::operations;
+
 namespace
 {
 
 struct Options
 {
     MaskRequest request;
+    std::vector<std::string> polygons;
     std::string coordinates;
     std::string bitmaps;
     std::string channels;
@@ -48,10 +54,10 @@ void Settle(Options& oOptions)
     oRequest.bitmaps = ParseNumbers(oOptions.bitmaps, "--bitmap");
     oRequest.channels = ParseNumbers(oOptions.channels, "--channels");
     oRequest.rule = oOptions.rule == "all" ? krv::gobs::eAllChannels : krv::gobs::eAnyChannel;
-    if (!oRequest.polygons.empty() + !oRequest.bitmaps.empty() + oRequest.noData != 1)
+    if (!oOptions.polygons.empty() + !oRequest.bitmaps.empty() + oRequest.noData != 1)
         throw UsageError("mask: say what it is made of: --polygon, --bitmap or --no-data, one of them");
     const bool bPlaced = !oOptions.coordinates.empty() || !oRequest.crs.empty();
-    if (bPlaced && oRequest.polygons.empty())
+    if (bPlaced && oOptions.polygons.empty())
         throw UsageError("mask: --coordinates and --crs belong to --polygon");
     if ((!oRequest.channels.empty() || !oOptions.rule.empty()) && !oRequest.noData)
         throw UsageError("mask: --channels and --rule belong to --no-data");
@@ -73,14 +79,22 @@ void Settle(Options& oOptions)
         oRequest.kind = BitmapKind::eZone;
 }
 
+MaskResult Make(const std::string& file, Options& oOptions)
+{
+    const SourceFile oFile(file, oOptions.request.IsWriting() ? eUpdate : eReadOnly);
+    for (const std::string& text : oOptions.polygons)
+        oOptions.request.polygons.push_back(ReadPolygons(text));
+    return MakeMask(oFile, oOptions.request, ShowProgress());
+}
+
 int RunMask(const std::string& file, Options& oOptions)
 {
     Settle(oOptions);
-    MaskRequest& oRequest = oOptions.request;
+    const MaskRequest& oRequest = oOptions.request;
     std::error_code oNone;
     if (!oRequest.picture.empty() && std::filesystem::equivalent(file, oRequest.picture, oNone))
         throw UsageError(oRequest.picture + " is the file itself; name another for the picture");
-    const MaskResult oResult = MakeMask(file, oRequest);
+    const MaskResult oResult = Make(file, oOptions);
     const char* const pSource = oRequest.noData ? "no-data" : oRequest.bitmaps.empty() ? "polygons" : "bitmaps";
     if (oOptions.json)
     {
@@ -116,7 +130,7 @@ void AddMaskVerb(CLI::App& oApp, Selection& oSelection)
     const auto poOptions = std::make_shared<Options>();
     poVerb->add_option("FILE", oSelection.file, "The file")->required();
     poVerb
-        ->add_option("--polygon", poOptions->request.polygons,
+        ->add_option("--polygon", poOptions->polygons,
                      "Pixels inside: WKT or GeoJSON, the text itself or a file; may be repeated")
         ->expected(1)
         ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);

@@ -1,7 +1,8 @@
+#include "operations/picture/quicklook.h"
 #include "operations/source/sourcefile.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
-#include "tools/krv/quicklook.h"
+#include "tools/krv/progress.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -28,6 +29,40 @@ struct Options
     QuickLookOptions look;
 };
 
+const char* ReasonText(DisplayReason eReason)
+{
+    switch (eReason)
+    {
+    case DisplayReason::eAsked:
+        return "as asked";
+    case DisplayReason::eDefaults:
+        return "the file's display defaults";
+    case DisplayReason::eColourTable:
+        return "it has a colour table";
+    case DisplayReason::eRoles:
+        return "described as red, green and blue";
+    case DisplayReason::eInks:
+        return "cyan, magenta, yellow and black";
+    case DisplayReason::eFirstThree:
+        return "the first three";
+    default:
+        return "the first";
+    }
+}
+
+std::string Describe(const QuickLook& oLook)
+{
+    const DisplayChoice& oChoice = oLook.choice;
+    std::string text = fmt::format("channel{} {} ({})", oChoice.channels.size() > 1 ? "s" : "",
+                                   fmt::join(oChoice.channels, ", "), ReasonText(oChoice.reason));
+    if (oChoice.table != nullptr)
+        return text + ", colour table";
+    text += ", shown from";
+    for (const Stretch& oStretch : oLook.stretches)
+        text += fmt::format(" {:g}..{:g}", oStretch.low, oStretch.high);
+    return text;
+}
+
 int RunView(const std::string& file, Options& oOptions)
 {
     oOptions.look.channels = ParseNumbers(oOptions.channels, "--channels");
@@ -36,10 +71,10 @@ int RunView(const std::string& file, Options& oOptions)
     if (std::filesystem::equivalent(file, oOptions.target, oNone))
         throw UsageError(oOptions.target + " is the file itself; name another for the quick look");
     const SourceFile oFile(file);
-    const QuickLook oLook = MakeQuickLook(oFile, oOptions.look);
+    const QuickLook oLook = MakeQuickLook(oFile, oOptions.look, ShowProgress());
     WritePng(oLook.picture, oOptions.target);
-    Print(fmt::format("{}: {} x {}, {}\n", oOptions.target, oLook.picture.width, oLook.picture.height,
-                      oLook.description));
+    Print(
+        fmt::format("{}: {} x {}, {}\n", oOptions.target, oLook.picture.width, oLook.picture.height, Describe(oLook)));
     return 0;
 }
 

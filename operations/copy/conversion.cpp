@@ -1,0 +1,266 @@
+#include "operations/copy/conversion.h"
+
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/ioverviewmanager.h"
+#include "datasources/interfaces/ipageddataset.h"
+#include "datasources/interfaces/ipctdataset.h"
+#include "datasources/reader/basicreader.h"
+#include "datasources/writer/basicwriter.h"
+#include "gobs/pct/pct.h"
+#include "operations/copy/detail/copylevels.h"
+#include "operations/copy/detail/copypixels.h"
+#include "operations/copy/detail/copyrecord.h"
+#include "operations/copy/detail/copyvalidity.h"
+#include "operations/copy/detail/keptform.h"
+#include "operations/copy/detail/target.h"
+#include "operations/job/exceptions.h"
+#include "operations/job/progress.h"
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/ogc/cs/icrs.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <filesystem>
+#include <memory>
+#include <system_error>
+
+namespace krv::operations
+{
+
+using namespace detail;
+
+using namespace krv::datasources;
+
+namespace
+{
+
+void CheckTarget(const CopyRequest& oRequest, const std::string& target)
+{
+    std::error_code oNone;
+    for (const std::string& source : oRequest.sources)
+    {
+        if (std::filesystem::equivalent(source, target, oNone))
+            throw RequestException(target + " is the file itself; name another for the copy");
+    }
+    if (std::filesystem::exists(target, oNone) && !std::filesystem::is_regular_file(target, oNone))
+        throw krv::DataException(target + " is there and no plain file; name another for the copy");
+}
+
+std::string Of(const CopyPlan& oPlan, std::size_t nSource, const std::string& what)
+{
+    return oPlan.GetSource(nSource).GetName() + ": " + what;
+}
+
+// The tables of the copied channels, each once.
+TableNumbers CopyTables(const CopyPlan& oPlan, const Target& oTarget)
+{
+    TableNumbers oNumbers;
+    unsigned int nPosition = 0;
+    for (const CopiedChannel& oChannel : oPlan.GetChannels())
+    {
+        ++nPosition;
+        auto* const poFrom = dynamic_cast<IPCTDataset*>(&oPlan.GetSource(oChannel.source).GetDataset());
+        for (const unsigned int nTable : poFrom != nullptr ? poFrom->GetPCTList() : std::vector<unsigned int>())
+        {
+            if (poFrom->GetPCTChannel(nTable) != oChannel.channel || oNumbers.contains({oChannel.source, nTable}))
+                continue;
+            auto* const poTo = oTarget.Find<IPCTDataset>();
+            const std::string what = Of(oPlan, oChannel.source, fmt::format("colour table {}", nTable));
+            if (poTo == nullptr)
+            {
+                Target::Warn(what + " is not kept: the format has none");
+                continue;
+            }
+            oTarget.Try(what,
+                        [&]
+                        {
+                            const std::unique_ptr<krv::gobs::PCT> poTable(poFrom->GetPCT(nTable));
+                            const unsigned int nNew = poTo->CreatePCT(*poTable, nPosition);
+                            oNumbers[{oChannel.source, nTable}] = nNew;
+                            const std::string description = poFrom->GetPCTDescription(nTable);
+                            if (!description.empty())
+                                poTo->SetPCTDescription(nNew, description);
+                        });
+        }
+    }
+    return oNumbers;
+}
+
+// Where the first file lies on the ground. The identity says nothing, unless a reference system stands beside it and no
+// control points do.
+void CopyGeography(const CopyPlan& oPlan, const Target& oTarget)
+{
+    const SourceFile& oSource = oPlan.GetSource(0);
+    std::unique_ptr<krv::ogc::cs::ICRS> poCrs;
+    oTarget.Try(Of(oPlan, 0, "the reference system"), [&] { poCrs.reset(oSource.GetDataset().ReadCRS()); });
+    if (poCrs != nullptr)
+        oTarget.Try(Of(oPlan, 0, "the reference system"), [&] { oTarget.Get().UpdateCRS(*poCrs); });
+    const auto* const poFrom = dynamic_cast<IGeocodedDataset*>(&oSource.GetDataset());
+    if (poFrom == nullptr)
+        return;
+    const bool bPlaced = poCrs != nullptr && oSource.GetMetadata().GetFileMetadataValue("GroundControlPoints").empty();
+    const krv::ogc::cs::GeocodingInfo& oInfo = poFrom->GetGeocoding();
+    for (std::size_t s = 1; s < oPlan.GetSourceCount(); ++s)
+    {
+        const auto* const poOther = dynamic_cast<IGeocodedDataset*>(&oPlan.GetSource(s).GetDataset());
+        if (poOther != nullptr && !(poOther->GetGeocoding() == oInfo))
+            Target::Warn(Of(oPlan, s, "it lies elsewhere than " + oSource.GetName() + ", whose place is taken"));
+    }
+    if (oInfo.IsIdentity() && !bPlaced)
+        return;
+    auto* const poTo = oTarget.Find<IGeocodedDataset>();
+    if (poTo == nullptr)
+        return Target::Warn(Of(oPlan, 0, "the geocoding is not kept: the format has none"));
+    oTarget.Try(Of(oPlan, 0, "the geocoding"),
+                [&] { poTo->SetGeocoding(ShiftGeocoding(oInfo, oPlan.GetWindow().x, oPlan.GetWindow().y)); });
+}
+
+void CopyChannels(const CopyPlan& oPlan, const Target& oTarget)
+{
+    const auto& oChannels = oPlan.GetChannels();
+    std::vector<krv::gobs::DataType> oTypes = oPlan.GetTypes();
+    ProgressCounter oCounter(oTarget.GetProgress(), "convert",
+                             [&]
+                             {
+                                 std::uint64_t nBytes = 0;
+                                 for (const auto& oType : oTypes)
+                                     nBytes += krv::gobs::BufferBytes(oPlan.GetWindow().width, oPlan.GetWindow().height,
+                                                                      1, oType);
+                                 return nBytes;
+                             }());
+    std::sort(oTypes.begin(), oTypes.end());
+    oTypes.erase(std::unique(oTypes.begin(), oTypes.end()), oTypes.end());
+    for (const krv::gobs::DataType& oType : oTypes)
+    {
+        // The channels of one type make one writer; those of one file and type one reader.
+        std::vector<unsigned int> oWritten;
+        std::vector<std::pair<std::size_t, krv::gobs::DataType>> oKeys;
+        std::vector<std::vector<unsigned int>> oRead;
+        std::vector<CopySource> oSources;
+        for (std::size_t i = 0; i < oChannels.size(); ++i)
+        {
+            if (oChannels[i].to != oType)
+                continue;
+            const std::pair oKey(oChannels[i].source, oChannels[i].from);
+            const auto nAt = static_cast<std::size_t>(std::find(oKeys.begin(), oKeys.end(), oKey) - oKeys.begin());
+            if (nAt == oKeys.size())
+            {
+                oKeys.push_back(oKey);
+                oRead.emplace_back();
+                oSources.emplace_back();
+            }
+            oRead[nAt].push_back(oChannels[i].channel);
+            oSources[nAt].positions.push_back(static_cast<unsigned int>(oWritten.size()));
+            oWritten.push_back(static_cast<unsigned int>(i) + 1);
+        }
+        std::vector<LevelReader> oReaders;
+        for (std::size_t nAt = 0; nAt < oKeys.size(); ++nAt)
+            oReaders.push_back(oPlan.GetSource(oKeys[nAt].first).Read(oRead[nAt]));
+        for (std::size_t nAt = 0; nAt < oKeys.size(); ++nAt)
+            oSources[nAt].reader = &oReaders[nAt].Get();
+        BasicWriter oWriter(&oTarget.GetRaster(), oWritten);
+        CopyPixels(oSources, oWriter, oPlan.GetWindow(), oCounter);
+    }
+}
+
+unsigned int CopyBitmap(IBitmapDataset& oFrom, unsigned int nFrom, IBitmapDataset& oTo, const PixelWindow& oWindow,
+                        const Progress& oProgress)
+{
+    const unsigned int nTo = oTo.CreateBitmap();
+    oTo.SetBitmapDescription(nTo, oFrom.GetBitmapDescription(nFrom));
+    const MetadataMap oTags = oFrom.GetBitmapMetadata(nFrom);
+    if (!oTags.empty())
+        oTo.SetBitmapMetadata(nTo, oTags);
+    BasicReader oReader(&oFrom, {nFrom}, false);
+    BasicWriter oWriter(&oTo, {nTo});
+    ProgressCounter oCounter(oProgress, "bitmap", std::uint64_t{oWindow.width} * oWindow.height);
+    CopyPixels({{&oReader, {0}}}, oWriter, oWindow, oCounter);
+    return nTo;
+}
+
+// Those of the first file: a validity mask of another one would hold for all channels.
+BitmapNumbers CopyBitmaps(const CopyPlan& oPlan, const Target& oTarget)
+{
+    auto* const poTo = oTarget.Find<IBitmapDataset>();
+    BitmapNumbers oNumbers;
+    for (std::size_t s = 0; s < oPlan.GetSourceCount(); ++s)
+    {
+        auto* const poFrom = dynamic_cast<IBitmapDataset*>(&oPlan.GetSource(s).GetDataset());
+        const auto oList = poFrom != nullptr ? poFrom->GetBitmapList() : std::vector<unsigned int>();
+        if (oList.empty())
+            continue;
+        if (poTo == nullptr || s > 0)
+        {
+            Target::Warn(Of(oPlan, s,
+                            poTo == nullptr ? "bitmaps are not kept: the format has none"
+                                            : "bitmaps are not kept: those of the first file are"));
+            continue;
+        }
+        for (const unsigned int nBitmap : oList)
+            oNumbers[nBitmap] = CopyBitmap(*poFrom, nBitmap, *poTo, oPlan.GetWindow(), oTarget.GetProgress());
+    }
+    return oNumbers;
+}
+
+void WarnOfFurtherImages(const CopyPlan& oPlan)
+{
+    for (std::size_t s = 0; s < oPlan.GetSourceCount(); ++s)
+    {
+        const auto* const poPages = dynamic_cast<const IPagedDataset*>(&oPlan.GetSource(s).GetDataset());
+        const unsigned int nFurther = poPages != nullptr ? poPages->CountFurtherImages() : 0;
+        if (nFurther != 0)
+            Target::Warn(Of(oPlan, s, fmt::format("{} further images of the file are not copied", nFurther)));
+    }
+}
+
+bool HasLevels(const SourceFile& oSource)
+{
+    const std::unique_ptr<IOverviewManager> poLevels(oSource.GetRaster().GetOverviewManager());
+    return poLevels != nullptr && !poLevels->GetLevels().empty();
+}
+
+} // namespace
+
+void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress)
+{
+    CheckTarget(oRequest, oForm.name);
+    const CopyPlan oPlan(oRequest);
+    WarnOfFurtherImages(oPlan);
+    const Target oTarget(oPlan, oForm, oProgress);
+    // What a codec changes says nothing of validity any more: a mask does.
+    const bool bPixelsChange = oTarget.IsLossy() && !oTarget.TakesBlocks();
+    const bool bMask = bPixelsChange && HasValidityInValues(oPlan);
+    if (bMask && oTarget.Find<IBitmapDataset>() == nullptr)
+        WriteValidity(oPlan, oTarget, 0);
+    const TableNumbers oTables = CopyTables(oPlan, oTarget);
+    CopyGeography(oPlan, oTarget);
+    const AuxiliaryData oRecord = MakeRecord(oPlan, oForm.name, oTables, bPixelsChange, bMask);
+    oTarget.Try("the metadata", [&] { oTarget.Get().WriteAuxiliaryData(oRecord); });
+    if (oTarget.TakesBlocks())
+        MoveBlocks(oPlan, oTarget, 1);
+    else
+        CopyChannels(oPlan, oTarget);
+    const BitmapNumbers oBitmaps = CopyBitmaps(oPlan, oTarget);
+    if (bMask)
+    {
+        Target::Warn(oForm.name +
+                     ": no-data values are not kept: pixels change when they are encoded; a mask says which are valid");
+        WriteValidity(oPlan, oTarget, FindValidityMask(*oTarget.Find<IBitmapDataset>()));
+    }
+    // LAYOUT=COG means the same to every format: a file laid out for reading over a network has its levels.
+    const auto oOptions = ParseOptions(oForm.options);
+    const auto oLayout = oOptions.find("LAYOUT");
+    const bool bWanted = oLayout != oOptions.end() && oLayout->second == "COG" && !HasLevels(oPlan.GetSource(0));
+    // Levels that are encoded with loss beside blocks that moved: a mask tells of theirs which pixels are valid.
+    auto* const poBitmaps = oTarget.Find<IBitmapDataset>();
+    if (bWanted && oTarget.IsLossy() && poBitmaps != nullptr && FindValidityMask(*poBitmaps) == 0 &&
+        HasValidityInValues(oPlan))
+        WriteValidity(oPlan, oTarget, 0);
+    CopyLevels(oPlan, oTarget, oBitmaps, oPlan.IsWholeFile() && !oPlan.IsCut() && oPlan.AreTypesKept() && !bMask,
+               bWanted);
+    oTarget.Get().Close();
+}
+
+} // namespace krv::operations

@@ -1,0 +1,50 @@
+#pragma once
+
+#include "gobs/raster/datatype.h"
+#include "operations/api.h"
+#include "operations/job/progress.h"
+
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace krv::operations
+{
+
+// A rectangle of pixels.
+struct PixelWindow
+{
+    unsigned int x = 0;
+    unsigned int y = 0;
+    unsigned int width = 0;
+    unsigned int height = 0;
+};
+
+// What the user wants copied.
+struct CopyRequest
+{
+    std::vector<std::string> sources;
+    std::vector<unsigned int> channels;      // counted from 1 through all files; empty: all
+    std::optional<PixelWindow> window;       // nothing: the whole image
+    std::optional<krv::gobs::DataType> type; // of all channels; nothing: each keeps its own
+    bool promote = false;                    // the smallest type that holds all, in place of `type`
+};
+
+// How the copy is stored.
+struct TargetForm
+{
+    std::string name;
+    std::string format;  // short name; empty: by the name's extension, else TIF
+    std::string options; // as the format takes them
+};
+
+// Copies channels of one or several files of one size into a new file: pixels, metadata, geocoding, reference system,
+// colour tables, bitmaps and levels; with the option LAYOUT=COG levels are built when there are none. What the options
+// leave open stays as the first file has it: codec, predictor, blocks and interleaving; a whole image is copied block
+// by block as it is stored. Pixels are never encoded with loss unless the options ask for it, and then a mask says
+// which are valid. Warns of what the target's format cannot hold. A file of that name is replaced when the copy is
+// complete; on a failure, and when the user stops it, nothing changes. Throws RequestException for what makes no sense,
+// DataException when the target is one of the sources or no plain file, and what formats throw.
+KRV_OPERATIONS_API void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress = {});
+
+} // namespace krv::operations

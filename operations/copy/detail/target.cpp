@@ -1,0 +1,187 @@
+#include "operations/copy/detail/target.h"
+
+#include "datasources/interfaces/ifileformat.h"
+#include "datasources/interfaces/inewfiledataset.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "datasources/iomanager/formatcapabilities.h"
+#include "operations/copy/detail/keptform.h"
+#include "operations/job/exceptions.h"
+#include "toolkit/nspio/warning.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <cctype>
+#include <filesystem>
+
+namespace krv::operations::detail
+{
+
+using namespace krv::datasources;
+
+namespace
+{
+
+bool EqualNames(const std::string& first, const std::string& second)
+{
+    return std::equal(first.begin(), first.end(), second.begin(), second.end(),
+                      [](unsigned char a, unsigned char b) { return std::tolower(a) == std::tolower(b); });
+}
+
+// By the extension of the file's name when the user names no format. A name whose extension belongs to none is refused:
+// a file of another kind under it would deceive every other program.
+std::string ChooseFormat(const TargetForm& oForm)
+{
+    const DatasetManager& oManager = *DatasetManager::GetInstance();
+    const std::string extension = std::filesystem::path(oForm.name).extension().string();
+    std::string format = extension.size() < 2 ? "TIF" : "";
+    std::string all;
+    bool bKnown = oForm.format.empty();
+    for (const IFileFormat* const poFormat : oManager.GetFormatList())
+    {
+        for (const std::string& own : poFormat->GetExtensions())
+        {
+            if (oForm.format.empty() && EqualNames("." + own, extension))
+                format = poFormat->GetShortName();
+        }
+        bKnown = bKnown || EqualNames(poFormat->GetShortName(), oForm.format);
+        all += (all.empty() ? "" : ", ") + poFormat->GetShortName();
+    }
+    if (!bKnown)
+        throw RequestException(fmt::format("--format: there is no format {}; there are {}", oForm.format, all));
+    if (oForm.format.empty() && format.empty())
+        throw RequestException(fmt::format(
+            "{}: no format has the extension {}; name the file otherwise, or choose with "
+            "--format among {}{}",
+            oForm.name, extension, all, EqualNames(extension, ".png") ? " (`krv view` makes pictures)" : ""));
+    if (!oForm.format.empty())
+    {
+        format = oForm.format;
+        std::transform(format.begin(), format.end(), format.begin(), [](unsigned char c) { return std::toupper(c); });
+    }
+    if (!oManager.GetCapabilities(format).IsSupported(CAPABILITY_CREATE))
+        throw RequestException(
+            fmt::format("{}: the format {} cannot create files; choose another with --format", oForm.name, format));
+    return format;
+}
+
+} // namespace
+
+void Target::Warn(const std::string& message)
+{
+    krv::nspio::Warning::Warn(message, "operations/copy/conversion", 0);
+}
+
+Target::Target(const CopyPlan& oPlan, const TargetForm& oForm, const Progress& oProgress)
+    : moName(oForm.name), moFormat(ChooseFormat(oForm)), moProgress(oProgress),
+      mbNew(!std::filesystem::exists(oForm.name))
+{
+    if (const auto oMoved = FindMovedForm(oPlan, oForm.options))
+    {
+        MakeByUser(oPlan, oForm, WithoutForm(oForm.options));
+        auto* const poBlocks = Find<IEncodedBlocks>();
+        mbTakesBlocks = poBlocks != nullptr && poBlocks->SetEncodedForm(1, *oMoved);
+    }
+    if (!mbTakesBlocks)
+        MakeLikeSource(oPlan, oForm);
+}
+
+bool Target::IsLossy() const
+{
+    auto* const poBlocks = Find<IEncodedBlocks>();
+    return poBlocks != nullptr && poBlocks->GetEncodedForm(1).mbLossy;
+}
+
+void Target::Make(const CopyPlan& oPlan, const std::string& options)
+{
+    mpoDataset.reset(); // the one before goes first: both have the same name
+    mpoDataset.reset(DatasetManager::GetInstance()->NewDataset(moName, moFormat, options));
+    // A file that another program makes meanwhile is not replaced.
+    if (auto* const poNew = Find<INewFileDataset>(); poNew != nullptr && mbNew)
+        poNew->KeepExisting();
+    mpoRaster = dynamic_cast<IRasterDataset*>(mpoDataset.get());
+    if (mpoRaster == nullptr)
+        throw krv::DataException(moName + ": the format does not hold images");
+    mpoRaster->Create(oPlan.GetWindow().width, oPlan.GetWindow().height, oPlan.GetTypes());
+}
+
+bool Target::TryMake(const CopyPlan& oPlan, const std::string& options)
+{
+    try
+    {
+        Make(oPlan, options);
+        return true;
+    }
+    catch (const krv::DataException&)
+    {
+        return false;
+    }
+}
+
+// What a format holds against the options that it was given is a matter of the command line.
+void Target::MakeByUser(const CopyPlan& oPlan, const TargetForm& oForm, const std::string& options)
+{
+    const auto oTypes = oPlan.GetTypes();
+    const bool bMixed =
+        std::any_of(oTypes.begin(), oTypes.end(), [&](const auto& oType) { return oType != oTypes.front(); });
+    try
+    {
+        Make(oPlan, options);
+    }
+    catch (const krv::DataException& oError)
+    {
+        if (bMixed)
+            throw krv::DataException(oError.GetMessage() + " (--type gives all channels one type)");
+        if (oForm.options.empty())
+            throw;
+        throw RequestException("--options: " + oError.GetMessage());
+    }
+}
+
+void Target::MakeLikeSource(const CopyPlan& oPlan, const TargetForm& oForm)
+{
+    std::vector<KeptOption> oKept = FindKeptOptions(oPlan, oForm.options);
+    const auto Joined = [](const std::string& first, const std::string& second)
+    {
+        return first + (first.empty() ? "" : " ") + second;
+    };
+    std::string options = oForm.options;
+    std::vector<std::string> oLeft;
+    if (!DatasetManager::GetInstance()->GetCapabilities(moFormat).IsSupported(CAPABILITY_NARROW_SAMPLES))
+        std::erase_if(oKept,
+                      [&oLeft](const KeptOption& oOption)
+                      {
+                          const bool bNarrow = oOption.options.starts_with("NBITS=");
+                          if (bNarrow)
+                              oLeft.push_back(oOption.what);
+                          return bNarrow;
+                      });
+    std::string all = options;
+    for (const KeptOption& oOption : oKept)
+        all = Joined(all, oOption.options);
+    bool bMade = !oKept.empty() && TryMake(oPlan, all);
+    for (std::size_t nAt = 0; nAt < oKept.size() && !bMade; ++nAt)
+    {
+        const KeptOption& oOption = oKept[nAt];
+        if (TryMake(oPlan, Joined(options, oOption.options)))
+        {
+            options = Joined(options, oOption.options);
+            continue;
+        }
+        if (!oOption.what.empty())
+            oLeft.push_back(oOption.what);
+        if (!oOption.instead.empty() && TryMake(oPlan, Joined(options, oOption.instead)))
+            options = Joined(options, oOption.instead);
+    }
+    if (!bMade)
+        MakeByUser(oPlan, oForm, options);
+    const auto oForms = FindForm(oPlan.GetSource(0));
+    const bool bAsked = ParseOptions(oForm.options).contains("COMPRESS");
+    if (oForms && oForms->mbLossy && !bAsked)
+        oLeft.insert(oLeft.begin(),
+                     fmt::format("compression {} (its pixels are stored without further loss)", oForms->moCodec));
+    if (!oLeft.empty())
+        Warn(fmt::format("{}: not kept of {}: {}", moName, oPlan.GetSource(0).GetName(), fmt::join(oLeft, ", ")));
+}
+
+} // namespace krv::operations::detail

@@ -1,0 +1,411 @@
+#include "operations/diagnosis/diagnosis.h"
+
+#include "datasources/formatregistrar/winformatregistrar.h"
+#include "datasources/interfaces/formatplugin.h"
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/ifileformat.h"
+#include "datasources/interfaces/ioverviewmanager.h"
+#include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/irasterio.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "datasources/metadata/auxiliarydata.h"
+#include "datasources/reader/basicreader.h"
+#include "gobs/pct/pct.h"
+#include "gobs/raster/raster.h"
+#include "operations/job/exceptions.h"
+#include "operations/source/sourcefile.h"
+#include "toolkit/core/core.h"
+#include "toolkit/nspio/warning.h"
+#include "toolkit/ogc/cs/icrs.h"
+#include "toolkit/xml/xmltree.h"
+
+#include <fmt/format.h>
+
+#include <array>
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <iterator>
+#include <string_view>
+
+namespace krv::operations
+{
+
+using namespace krv::datasources;
+
+namespace
+{
+
+constexpr std::size_t HEADER_BYTES = 4096;
+
+std::string ReadAll(const std::string& path)
+{
+    std::ifstream oStream(path, std::ios::binary);
+    return {std::istreambuf_iterator<char>(oStream), std::istreambuf_iterator<char>()};
+}
+
+std::string Trim(const std::string& text)
+{
+    constexpr char BLANKS[] = " \t\r\n";
+    const auto nFirst = text.find_first_not_of(BLANKS);
+    return nFirst == std::string::npos ? std::string()
+                                       : text.substr(nFirst, text.find_last_not_of(BLANKS) - nFirst + 1);
+}
+
+} // namespace
+
+InstallationCheck::InstallationCheck() : moHome(GetFormatHome())
+{
+    CheckHome();
+    CheckRegistry();
+    CheckManager();
+}
+
+InstallationCheck::~InstallationCheck() = default;
+
+void InstallationCheck::Good(const std::string& subject, const std::string& found)
+{
+    moFindings.push_back({true, subject, found, {}});
+}
+
+void InstallationCheck::Bad(const std::string& subject, const std::string& found, const std::string& remedy)
+{
+    moFindings.push_back({false, subject, found, remedy});
+}
+
+void InstallationCheck::CheckHome()
+{
+    const std::string variable = IMPGetEnv("KRVHOME");
+    const std::string origin = variable.empty() ? "KRVHOME is not set; the home beside the library" : "from KRVHOME";
+    if (std::filesystem::is_directory(moHome))
+        Good("home " + moHome, origin);
+    else
+        Bad("home " + moHome, origin + "; there is no such folder",
+            variable.empty() ? "reinstall, or set KRVHOME" : "unset KRVHOME, or set it to an installation");
+}
+
+void InstallationCheck::CheckRegistry()
+{
+    const std::string path = moHome + "/etc/" + GetFormatRegistryFilename();
+    const std::string subject = "registry " + path;
+    const std::string why = WhyUnreadable(path);
+    if (!why.empty())
+        return Bad(subject, why, "reinstall, or set KRVHOME to an installation");
+    std::vector<std::string> oDescriptions;
+    try
+    {
+        const std::string text = ReadAll(path);
+        const krv::xml::Element oRoot = krv::xml::ParseTree(text.data(), text.size(), path);
+        for (const krv::xml::Element& oChild : oRoot.children)
+        {
+            if (oRoot.name == "Formats" && oChild.name == "Format")
+                oDescriptions.push_back(Trim(oChild.text));
+        }
+    }
+    catch (...)
+    {
+        return Bad(subject, CurrentMessage(), "mend the XML, or reinstall");
+    }
+    if (oDescriptions.empty())
+        return Bad(subject, "lists no format", "reinstall, or add <Format>name.xml</Format> entries to <Formats>");
+    Good(subject, fmt::format("lists {} format{}", oDescriptions.size(), oDescriptions.size() == 1 ? "" : "s"));
+    for (const std::string& description : oDescriptions)
+        CheckDescription(description);
+}
+
+void InstallationCheck::CheckDescription(const std::string& description)
+{
+    if (description.empty())
+        return Bad("registry " + moHome + "/etc/" + GetFormatRegistryFilename(), "an entry is empty",
+                   "name a description in <Format>, or take the entry out");
+    const std::string path = moHome + "/etc/qrfformats/" + description;
+    const std::string subject = "description " + description;
+    const std::string why = WhyUnreadable(path);
+    if (!why.empty())
+        return Bad(subject, path + ": " + why, "reinstall the plug-in, or take the entry out of the registry");
+    try
+    {
+        const std::string text = ReadAll(path);
+        const krv::xml::Element oRoot = krv::xml::ParseTree(text.data(), text.size(), path);
+        const krv::xml::Element* const poObject = oRoot.name == "Format" ? oRoot.FindChild("Object") : nullptr;
+        if (poObject == nullptr || Trim(poObject->text).empty())
+            return Bad(subject, "names no library", "add <Object>name</Object> to <Format>, or reinstall the plug-in");
+        Good(subject, "names the library " + GetFormatLibraryFilename(Trim(poObject->text), "so"));
+        CheckPlugin(Trim(poObject->text));
+    }
+    catch (...)
+    {
+        Bad(subject, CurrentMessage(), "mend the XML, or reinstall the plug-in");
+    }
+}
+
+void InstallationCheck::CheckPlugin(const std::string& object)
+{
+    const std::string library = GetFormatLibraryFilename(object, "so");
+    const std::string subject = "plug-in " + library;
+    const std::string path = GetFormatLibraryPath(library);
+    void* const pLibrary = IMPOpenLibrary(path);
+    if (pLibrary == nullptr)
+        return Bad(subject, "does not load: " + IMPLibraryError(),
+                   "reinstall the plug-in and the libraries that it needs");
+    const auto pVersion = reinterpret_cast<int (*)()>(IMPFindSymbol(pLibrary, "GetQRFFormatVersion"));
+    if (pVersion == nullptr || IMPFindSymbol(pLibrary, "RegisterQRFFormat") == nullptr)
+        return Bad(subject, path + " is no format plug-in: an entry point is missing", "reinstall the plug-in");
+    try
+    {
+        const int nVersion = pVersion();
+        if (nVersion != KRV_QRF_FORMAT_VERSION)
+            return Bad(subject, fmt::format("has version {}, wanted is {}", nVersion, KRV_QRF_FORMAT_VERSION),
+                       "install the plug-in that belongs to this version");
+        CheckBuilder(library, pLibrary);
+    }
+    catch (...)
+    {
+        Bad(subject, "fails while it registers: " + CurrentMessage(), "reinstall or report the plug-in");
+    }
+}
+
+void InstallationCheck::CheckBuilder(const std::string& library, void* pLibrary)
+{
+    const auto pRegister = reinterpret_cast<IFileIOBuilder* (*)()>(IMPFindSymbol(pLibrary, "RegisterQRFFormat"));
+    std::unique_ptr<IFileIOBuilder> poBuilder(pRegister());
+    const IFileFormat* const poFormat = poBuilder != nullptr ? poBuilder->GetFileFormat() : nullptr;
+    if (poFormat == nullptr)
+        return Bad("plug-in " + library, "loads and offers no format", "reinstall or report the plug-in");
+    const std::string name = poFormat->GetShortName();
+    for (const LoadedPlugin& oOther : moPlugins)
+    {
+        if (oOther.name == name)
+            return Bad("plug-in " + library, "offers the format " + name + ", which an entry before it has already",
+                       "take one of the two entries out of the registry");
+    }
+    Good("plug-in " + library, fmt::format("loads; format {} ({})", name, poFormat->GetDescription()));
+    moPlugins.push_back({name, std::move(poBuilder)});
+}
+
+// The manager's own warning would say the finding twice.
+void InstallationCheck::CheckManager()
+{
+    const auto oFormerSink = krv::nspio::Warning::SetSink([](const std::string&, const std::string&, unsigned int) {});
+    try
+    {
+        const std::size_t nFormats = DatasetManager::GetInstance()->GetFormatList().size();
+        Good("start", fmt::format("{} format{} ready", nFormats, nFormats == 1 ? "" : "s"));
+    }
+    catch (...)
+    {
+        Bad("start", CurrentMessage(),
+            "mend what failed above: nothing opens while one entry of the registry is broken");
+    }
+    krv::nspio::Warning::SetSink(oFormerSink);
+}
+
+std::string GuessKind(const unsigned char* pHeader, std::size_t nBytes)
+{
+    struct Kind
+    {
+        std::size_t offset;
+        std::string_view signature;
+        const char* pName;
+    };
+    using namespace std::string_view_literals;
+    static constexpr Kind KINDS[] = {
+        {0, "II*\0"sv, "a TIFF file, little-endian"},
+        {0, "MM\0*"sv, "a TIFF file, big-endian"},
+        {0, "II+\0"sv, "a BigTIFF file, little-endian"},
+        {0, "MM\0+"sv, "a BigTIFF file, big-endian"},
+        {0, "\x89PNG\r\n\x1a\n"sv, "a PNG image"},
+        {0, "\xff\xd8\xff"sv, "a JPEG image"},
+        {4, "jP  "sv, "a JPEG 2000 image"},
+        {0, "\xff\x4f\xff\x51"sv, "a JPEG 2000 codestream"},
+        {0, "GIF8"sv, "a GIF image"},
+        {0, "BM"sv, "a BMP image"},
+        {0, "RIFF"sv, "a RIFF container, such as WebP"},
+        {0, "\x89HDF\r\n\x1a\n"sv, "an HDF5 or netCDF-4 file"},
+        {0, "\x0e\x03\x13\x01"sv, "an HDF4 file"},
+        {0, "CDF"sv, "a netCDF file"},
+        {0, "NITF"sv, "a NITF file"},
+        {0, "GRIB"sv, "a GRIB file"},
+        {0, "SIMPLE  ="sv, "a FITS file"},
+        {0, "ENVI"sv, "an ENVI header: name the data file beside it"},
+        {0, "PK\x03\x04"sv, "a ZIP archive: unpack it first"},
+        {0, "\x1f\x8b"sv, "gzip data: unpack it first"},
+        {0, "BZh"sv, "bzip2 data: unpack it first"},
+        {0,
+         "\xfd"
+         "7zXZ"sv,
+         "xz data: unpack it first"},
+        {0, "\x28\xb5\x2f\xfd"sv, "zstd data: unpack it first"},
+        {0, "%PDF"sv, "a PDF document"},
+        {0, "<?xml"sv, "an XML document"},
+        {0, "<!DOCTYPE html"sv, "a web page: was the download redirected?"},
+        {0, "<html"sv, "a web page: was the download redirected?"},
+        {0, "version https://git-lfs"sv, "a Git LFS pointer: fetch the real file with `git lfs pull`"}};
+    const std::string_view header(reinterpret_cast<const char*>(pHeader), nBytes);
+    for (const Kind& oKind : KINDS)
+    {
+        if (header.size() >= oKind.offset && header.substr(oKind.offset).starts_with(oKind.signature))
+            return oKind.pName;
+    }
+    return {};
+}
+
+namespace
+{
+
+using Header = std::array<unsigned char, HEADER_BYTES>;
+
+std::size_t ReadHeader(const std::string& file, Header& oHeader)
+{
+    std::ifstream oStream(file, std::ios::binary);
+    oStream.read(reinterpret_cast<char*>(oHeader.data()), static_cast<std::streamsize>(oHeader.size()));
+    return static_cast<std::size_t>(oStream.gcount());
+}
+
+// Pixels are missing from a file that was cut short: the last ones show it first.
+void ReadEnds(IDataset& oDataset, unsigned int nChannel)
+{
+    BasicReader oReader(&oDataset, {nChannel}, false);
+    for (const unsigned int nTile : {0U, oReader.GetTileCount() - 1})
+        const std::unique_ptr<krv::gobs::Raster> poTile(oReader.GetRaster(nTile));
+}
+
+// The blocks of the first and the last pixel.
+void ReadEnds(IRasterIO& oIO)
+{
+    constexpr std::size_t LARGEST_PIXEL = 16;
+    std::array<unsigned char, LARGEST_PIXEL> oPixel{};
+    oIO.ReadWindow(0U, 0U, 1U, 1U, oPixel.data());
+    oIO.ReadWindow(oIO.GetFileWidth() - 1, oIO.GetFileHeight() - 1, 1U, 1U, oPixel.data());
+}
+
+std::string DescribeOpened(IDataset& oDataset)
+{
+    const auto* const poRaster = dynamic_cast<IRasterDataset*>(&oDataset);
+    if (poRaster == nullptr || poRaster->GetChanCount() == 0)
+        return "it opens, and holds no image";
+    ReadEnds(oDataset, 1);
+    ReadEnds(oDataset, poRaster->GetChanCount());
+    return fmt::format("it opens: {} x {} pixels, {} channel{}", poRaster->GetWidth(), poRaster->GetHeight(),
+                       poRaster->GetChanCount(), poRaster->GetChanCount() == 1 ? "" : "s");
+}
+
+constexpr const char* DAMAGE_REMEDY = "get an undamaged copy, or convert it to a plainer kind";
+
+// Reads what the other verbs read beside pixels, one thing after the other, so that each that fails is named.
+void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Finding>& oFindings)
+{
+    const auto Try = [&](const char* pWhat, const std::function<void()>& oRead)
+    {
+        try
+        {
+            oRead();
+        }
+        catch (...)
+        {
+            oFindings.push_back(
+                {false, subject, fmt::format("{} cannot be read: {}", pWhat, CurrentMessage()), DAMAGE_REMEDY});
+        }
+    };
+    Try("the metadata", [&] { oDataset.ReadAuxiliaryData(); });
+    Try("the reference system", [&] { std::unique_ptr<krv::ogc::cs::ICRS>(oDataset.ReadCRS()); });
+    if (auto* const poRaster = dynamic_cast<IRasterDataset*>(&oDataset); poRaster != nullptr)
+        Try("the levels",
+            [&]
+            {
+                const std::unique_ptr<IOverviewManager> poLevels(poRaster->GetOverviewManager());
+                for (const unsigned int nLevel : poLevels ? poLevels->GetLevels() : std::vector<unsigned int>())
+                    ReadEnds(*std::unique_ptr<IRasterIO>(poLevels->GetOverviewIO(nLevel, {1})));
+            });
+    if (auto* const poBitmaps = dynamic_cast<IBitmapDataset*>(&oDataset); poBitmaps != nullptr)
+        Try("the bitmaps",
+            [&]
+            {
+                for (const unsigned int nBitmap : poBitmaps->GetBitmapList())
+                    ReadEnds(*std::unique_ptr<IRasterIO>(poBitmaps->GetBitmapIO({nBitmap})));
+            });
+    if (const auto* const poTables = dynamic_cast<IPCTDataset*>(&oDataset); poTables != nullptr)
+        Try("the colour tables",
+            [&]
+            {
+                for (const unsigned int nTable : poTables->GetPCTList())
+                    std::unique_ptr<krv::gobs::PCT>(poTables->GetPCT(nTable));
+            });
+}
+
+// What is warned of while the file is read is a finding too.
+void CheckOpening(const std::string& file, const LoadedPlugin& oPlugin, std::vector<Finding>& oFindings)
+{
+    const std::string subject = "format " + oPlugin.name;
+    std::vector<std::string> oWarnings;
+    const auto oFormerSink = krv::nspio::Warning::SetSink(
+        [&oWarnings](const std::string& message, const std::string&, unsigned int) { oWarnings.push_back(message); });
+    try
+    {
+        const std::unique_ptr<IDataset> poDataset(oPlugin.builder->Open(file, eReadOnly));
+        if (poDataset == nullptr)
+            oFindings.push_back({false, subject, "recognises the file and opens nothing", "report the plug-in"});
+        else
+        {
+            oFindings.push_back({true, subject, "recognises the file; " + DescribeOpened(*poDataset), {}});
+            TryParts(*poDataset, subject, oFindings);
+        }
+    }
+    catch (...)
+    {
+        oFindings.push_back(
+            {false, subject, "recognises the file and cannot read it: " + CurrentMessage(), DAMAGE_REMEDY});
+    }
+    krv::nspio::Warning::SetSink(oFormerSink);
+    for (const std::string& warning : oWarnings)
+        oFindings.push_back({false, subject, warning, "what is named is not used; get an undamaged copy, or mend it"});
+}
+
+void AskPlugin(const std::string& file, const LoadedPlugin& oPlugin, const Header& oHeader, bool& bRecognised,
+               std::vector<Finding>& oFindings)
+{
+    try
+    {
+        const int nAnswer = oPlugin.builder->Identify(file, oHeader.data(), HEADER_BYTES, 0);
+        if (nAnswer != 0)
+            return oFindings.push_back(
+                {true, "format " + oPlugin.name, fmt::format("not its own (answer {})", nAnswer), {}});
+    }
+    catch (...)
+    {
+        return oFindings.push_back(
+            {false, "format " + oPlugin.name, "fails while it looks: " + CurrentMessage(), "report the plug-in"});
+    }
+    bRecognised = true;
+    CheckOpening(file, oPlugin, oFindings);
+}
+
+} // namespace
+
+std::vector<Finding> CheckFile(const std::string& file, const std::vector<LoadedPlugin>& oPlugins)
+{
+    const std::string why = WhyUnreadable(file);
+    if (!why.empty())
+        return {{false, "file " + file, why, {}}};
+    Header oHeader{};
+    const std::size_t nBytes = ReadHeader(file, oHeader);
+    const std::string kind = GuessKind(oHeader.data(), nBytes);
+    std::vector<Finding> oFindings{{true,
+                                    "file " + file,
+                                    fmt::format("{} bytes; begins like {}", std::filesystem::file_size(file),
+                                                kind.empty() ? "nothing that is known here" : kind),
+                                    {}}};
+    if (nBytes == 0)
+        return {{false, "file " + file, "it is empty", "get the file again"}};
+    bool bRecognised = false;
+    for (const LoadedPlugin& oPlugin : oPlugins)
+        AskPlugin(file, oPlugin, oHeader, bRecognised, oFindings);
+    if (!bRecognised)
+        oFindings.push_back({false, "file " + file, "no format recognises it",
+                             "install the plug-in of its format, or convert it to one that `krv formats` lists"});
+    return oFindings;
+}
+
+} // namespace krv::operations

@@ -1,0 +1,65 @@
+#pragma once
+
+#include "operations/api.h"
+
+#include <memory>
+#include <string>
+#include <vector>
+
+namespace krv::datasources
+{
+class IFileIOBuilder;
+}
+
+namespace krv::operations
+{
+
+// One thing that was looked at. A failed one says what to do.
+struct Finding
+{
+    bool good = true;
+    std::string subject;
+    std::string found;
+    std::string remedy;
+};
+
+// A plug-in that loaded, with a builder of its own, apart from the manager's.
+struct LoadedPlugin
+{
+    std::string name;
+    std::unique_ptr<krv::datasources::IFileIOBuilder> builder;
+};
+
+// Looks at an installation piece by piece, so that one broken piece does not hide the others: home, registry, every
+// description, every plug-in, and last the start of the manager as a whole.
+class KRV_OPERATIONS_API InstallationCheck
+{
+public:
+    InstallationCheck();
+    ~InstallationCheck();
+
+    const std::vector<Finding>& GetFindings() const { return moFindings; }
+    const std::vector<LoadedPlugin>& GetPlugins() const { return moPlugins; }
+
+private:
+    void CheckHome();
+    void CheckRegistry();
+    void CheckDescription(const std::string& description);
+    void CheckPlugin(const std::string& object);
+    void CheckBuilder(const std::string& library, void* pLibrary);
+    void CheckManager();
+    void Good(const std::string& subject, const std::string& found);
+    void Bad(const std::string& subject, const std::string& found, const std::string& remedy);
+
+    std::string moHome;
+    std::vector<Finding> moFindings;
+    std::vector<LoadedPlugin> moPlugins;
+};
+
+// Why a file opens or does not: the file itself, which plug-ins were asked, what each said, and what its opening gave.
+KRV_OPERATIONS_API std::vector<Finding> CheckFile(const std::string& file, const std::vector<LoadedPlugin>& oPlugins);
+
+// What kind of file the first bytes say it is, such as "a PNG image"; empty when they say nothing.
+KRV_OPERATIONS_API std::string GuessKind(const unsigned char* pHeader, std::size_t nBytes);
+
+} // namespace krv::operations

@@ -1,0 +1,25 @@
+#pragma once
+
+#include "operations/api.h"
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+namespace krv::operations
+{
+
+// An 8-bit picture in memory: 1 (grey), 2 (grey, alpha), 3 (red, green, blue) or 4 samples per pixel, rows top down.
+struct Picture
+{
+    unsigned int width = 0;
+    unsigned int height = 0;
+    unsigned int samples = 0;
+    std::vector<std::uint8_t> pixels;
+};
+
+// Writes the picture as PNG, replacing an existing file only when all is written. Throws krv::IOException naming the
+// file and the cause; nothing is left behind then.
+KRV_OPERATIONS_API void WritePng(const Picture& oPicture, const std::string& fileName);
+
+} // namespace krv::operations

@@ -1,0 +1,243 @@
+#include "operations/picture/quicklook.h"
+
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/reader/basicreader.h"
+#include "gobs/pct/pct.h"
+#include "operations/job/exceptions.h"
+#include "operations/job/progress.h"
+#include "operations/source/sourcefile.h"
+#include "toolkit/exceptions/exceptions.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+#include <cmath>
+#include <memory>
+#include <optional>
+
+namespace krv::operations
+{
+
+namespace
+{
+
+struct Size
+{
+    unsigned int width;
+    unsigned int height;
+};
+
+Size FitInto(unsigned int nWidth, unsigned int nHeight, unsigned int nLongest)
+{
+    const double nScale = std::min(static_cast<double>(nLongest) / std::max({nWidth, nHeight, 1U}), 1.0);
+    const auto Scaled = [nScale](unsigned int n)
+    {
+        return static_cast<unsigned int>(std::max(std::lround(n * nScale), 1L));
+    };
+    return {Scaled(nWidth), Scaled(nHeight)};
+}
+
+std::uint64_t ReaderBytes(const krv::datasources::IRasterReader& oReader)
+{
+    return krv::gobs::BufferBytes(oReader.GetWidth(), oReader.GetHeight(), oReader.GetChansCount(),
+                                  oReader.GetDataType());
+}
+
+// The planes of some channels, in their order, whatever their types.
+std::vector<Plane> ReadPlanes(const SourceFile& oFile, const std::vector<unsigned int>& oChannels, const Size& oSize,
+                              Reduction eReduction, const Progress& oProgress)
+{
+    const std::vector<ChannelGroup> oGroups = oFile.GroupByType(oChannels);
+    std::vector<LevelReader> oReaders;
+    std::uint64_t nBytes = 0;
+    for (const ChannelGroup& oGroup : oGroups)
+    {
+        oReaders.push_back(oFile.ReadAtLeast(oGroup.channels, oSize.width, oSize.height));
+        nBytes += ReaderBytes(oReaders.back().Get());
+    }
+    ProgressCounter oCounter(oProgress, "view", nBytes);
+    std::vector<Plane> oPlanes(oChannels.size());
+    for (std::size_t g = 0; g < oGroups.size(); ++g)
+    {
+        std::vector<OptionalNoData> oNoData;
+        for (const unsigned int nChannel : oGroups[g].channels)
+            oNoData.push_back(oFile.GetNoData(nChannel));
+        auto oFound = Reduce(oReaders[g].Get(), oNoData, oSize.width, oSize.height, eReduction, oCounter);
+        for (std::size_t i = 0; i < oFound.size(); ++i)
+            oPlanes[oGroups[g].positions[i]] = std::move(oFound[i]);
+    }
+    return oPlanes;
+}
+
+void Multiply(std::vector<float>& oOpacity, const Plane& oPlane, float nFull)
+{
+    for (std::size_t i = 0; i < oOpacity.size(); ++i)
+        oOpacity[i] *= std::clamp(oPlane.values[i] / nFull, 0.0F, 1.0F);
+}
+
+// Alpha that never exceeds 255 is meant in 8 bits, whatever the channel's type.
+float FullAlpha(const Plane& oAlpha, float nFull)
+{
+    const float nMost = *std::max_element(oAlpha.values.begin(), oAlpha.values.end());
+    return nMost <= 255.0F ? std::min(nFull, 255.0F) : nFull;
+}
+
+void ApplyAlpha(const SourceFile& oFile, const DisplayChoice& oChoice, const Size& oSize, std::vector<Plane>& oPlanes,
+                std::vector<float>& oOpacity, const Progress& oProgress)
+{
+    const Plane oAlpha = ReadPlanes(oFile, {oChoice.alphaChannel}, oSize, Reduction::eAverage, oProgress).front();
+    const float nFull = FullAlpha(oAlpha, oChoice.alphaFull);
+    Multiply(oOpacity, oAlpha, nFull);
+    for (Plane& oPlane : oPlanes)
+    {
+        for (std::size_t i = 0; oChoice.premultiplied && i < oPlane.values.size(); ++i)
+            oPlane.values[i] = oAlpha.values[i] > 0 ? oPlane.values[i] * nFull / oAlpha.values[i] : 0.0F;
+    }
+}
+
+// The bits are read at full size: levels of bitmaps are not always there.
+void ApplyMask(const SourceFile& oFile, unsigned int nBitmap, const Size& oSize, std::vector<float>& oOpacity,
+               const Progress& oProgress)
+{
+    auto* const poBitmaps = dynamic_cast<krv::datasources::IBitmapDataset*>(&oFile.GetDataset());
+    krv::datasources::BasicReader oReader(poBitmaps, {nBitmap}, false);
+    if (oReader.GetWidth() != oFile.GetRaster().GetWidth() || oReader.GetHeight() != oFile.GetRaster().GetHeight())
+        throw krv::DataException(fmt::format("{}: bitmap {} is not of the image's size", oFile.GetName(), nBitmap));
+    ProgressCounter oCounter(oProgress, "mask", ReaderBytes(oReader));
+    const auto oPlanes = Reduce(oReader, {std::nullopt}, oSize.width, oSize.height, Reduction::eAverage, oCounter);
+    Multiply(oOpacity, oPlanes.front(), 1.0F);
+}
+
+// Pixels that will not be seen take no part in the stretch.
+void HideTransparent(std::vector<Plane>& oPlanes, const std::vector<float>& oOpacity)
+{
+    for (Plane& oPlane : oPlanes)
+    {
+        for (std::size_t i = 0; i < oOpacity.size(); ++i)
+            oPlane.coverage[i] = oOpacity[i] > 0 ? oPlane.coverage[i] : 0.0F;
+    }
+}
+
+// Opacity of every pixel, 0 to 1: no-data in all shown channels, the validity mask and the alpha channel together.
+// Premultiplied colours become plain ones.
+std::vector<float> FindOpacity(const SourceFile& oFile, const DisplayChoice& oChoice, const Size& oSize,
+                               std::vector<Plane>& oPlanes, const Progress& oProgress)
+{
+    std::vector<float> oOpacity(oPlanes.front().coverage.size(), 0.0F);
+    for (const Plane& oPlane : oPlanes)
+    {
+        for (std::size_t i = 0; i < oOpacity.size(); ++i)
+            oOpacity[i] = std::max(oOpacity[i], oPlane.coverage[i]);
+    }
+    if (oChoice.alphaChannel != 0)
+        ApplyAlpha(oFile, oChoice, oSize, oPlanes, oOpacity, oProgress);
+    if (oChoice.maskBitmap != 0)
+        ApplyMask(oFile, oChoice.maskBitmap, oSize, oOpacity, oProgress);
+    HideTransparent(oPlanes, oOpacity);
+    return oOpacity;
+}
+
+// Cyan, magenta, yellow and black become red, green and blue: light passes each ink in turn.
+void MixInks(std::vector<Plane>& oPlanes, float nFull)
+{
+    for (std::size_t c = 0; c < 3; ++c)
+    {
+        for (std::size_t i = 0; i < oPlanes[c].values.size(); ++i)
+            oPlanes[c].values[i] = 255.0F * (1 - oPlanes[c].values[i] / nFull) * (1 - oPlanes[3].values[i] / nFull);
+    }
+    oPlanes.resize(3);
+}
+
+// Writes the colour samples of all pixels; the alpha sample, when there is one, is left.
+void PaintStretched(Picture& oPicture, const std::vector<Plane>& oPlanes, const std::vector<Stretch>& oStretches,
+                    bool bInverted)
+{
+    for (std::size_t c = 0; c < oPlanes.size(); ++c)
+    {
+        for (std::size_t i = 0; i < oPlanes[c].values.size(); ++i)
+        {
+            const std::uint8_t nLevel = oPlanes[c].coverage[i] > 0 ? oStretches[c](oPlanes[c].values[i]) : 0;
+            oPicture.pixels[i * oPicture.samples + c] = bInverted ? static_cast<std::uint8_t>(255 - nLevel) : nLevel;
+        }
+    }
+}
+
+void PaintTable(Picture& oPicture, const Plane& oPlane, const krv::gobs::PCT& oTable, std::vector<float>& oOpacity)
+{
+    const auto Byte = [](unsigned int n)
+    {
+        return static_cast<std::uint8_t>((n + 128) / 257);
+    };
+    for (std::size_t i = 0; i < oPlane.values.size(); ++i)
+    {
+        std::uint16_t nAlpha = 65535;
+        const auto oColour = oTable.GetValue16(static_cast<double>(oPlane.values[i]), nAlpha);
+        std::uint8_t* const pPixel = oPicture.pixels.data() + i * oPicture.samples;
+        pPixel[0] = Byte(oColour.red);
+        pPixel[1] = Byte(oColour.green);
+        pPixel[2] = Byte(oColour.blue);
+        oOpacity[i] *= static_cast<float>(nAlpha) / 65535.0F;
+    }
+}
+
+void PaintOpacity(Picture& oPicture, const std::vector<float>& oOpacity)
+{
+    for (std::size_t i = 0; i < oOpacity.size(); ++i)
+        oPicture.pixels[(i + 1) * oPicture.samples - 1] = static_cast<std::uint8_t>(std::lround(oOpacity[i] * 255.0F));
+}
+
+// Drops the alpha sample of a picture that is opaque everywhere.
+void DropOpaqueAlpha(Picture& oPicture)
+{
+    const unsigned int nSamples = oPicture.samples;
+    const std::size_t nPixels = oPicture.pixels.size() / nSamples;
+    for (std::size_t i = 0; i < nPixels; ++i)
+    {
+        if (oPicture.pixels[(i + 1) * nSamples - 1] != 255)
+            return;
+    }
+    for (std::size_t i = 0; i < nPixels; ++i)
+        std::copy_n(oPicture.pixels.begin() + static_cast<std::ptrdiff_t>(i * nSamples), nSamples - 1,
+                    oPicture.pixels.begin() + static_cast<std::ptrdiff_t>(i * (nSamples - 1)));
+    oPicture.pixels.resize(nPixels * (nSamples - 1));
+    --oPicture.samples;
+}
+
+} // namespace
+
+QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOptions, const Progress& oProgress)
+{
+    const auto& oRaster = oFile.GetRaster();
+    QuickLook oLook;
+    oLook.choice = ChooseDisplay(oFile, oOptions.channels);
+    const DisplayChoice& oChoice = oLook.choice;
+    const Size oSize = FitInto(oRaster.GetWidth(), oRaster.GetHeight(), oOptions.size);
+    const Reduction eReduction =
+        oChoice.table != nullptr || !oOptions.average ? Reduction::eNearest : Reduction::eAverage;
+    std::vector<Plane> oPlanes = ReadPlanes(oFile, oChoice.channels, oSize, eReduction, oProgress);
+    std::vector<float> oOpacity = FindOpacity(oFile, oChoice, oSize, oPlanes, oProgress);
+
+    const bool bInks = oPlanes.size() == 4;
+    if (bInks)
+        MixInks(oPlanes, oChoice.inkFull);
+
+    oLook.picture = {oSize.width, oSize.height, oChoice.table != nullptr || oPlanes.size() == 3 ? 4U : 2U, {}};
+    oLook.picture.pixels.resize(static_cast<std::size_t>(oSize.width) * oSize.height * oLook.picture.samples);
+    if (oChoice.table != nullptr)
+        PaintTable(oLook.picture, oPlanes.front(), *oChoice.table, oOpacity);
+    else
+    {
+        for (std::size_t c = 0; c < oPlanes.size(); ++c)
+            oLook.stretches.push_back(FindStretch(oPlanes[c], bInks ? StretchMode::eNone : oOptions.stretch,
+                                                  oFile.GetType(oChoice.channels[c]) == krv::gobs::eDT_8U));
+        PaintStretched(oLook.picture, oPlanes, oLook.stretches, oChoice.inverted);
+    }
+    PaintOpacity(oLook.picture, oOpacity);
+    DropOpaqueAlpha(oLook.picture);
+    return oLook;
+}
+
+} // namespace krv::operations

@@ -1,0 +1,16 @@
+#pragma once
+
+#include "operations/source/fileinfo.h"
+#include "tools/krv/jsontext.h"
+
+namespace krv::tool
+{
+
+// With the field names that `krv info --json` promises. Absent facts are null, absent lists empty. A channel's no-data
+// value is text.
+Json InfoToJson(const operations::FileInfo& oInfo);
+
+// The same for people.
+std::string InfoText(const Json& oInfo);
+
+} // namespace krv::tool
