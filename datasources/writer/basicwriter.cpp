@@ -122,7 +122,7 @@ BasicWriter::BasicWriter(IRasterDataset* poDataset, IRasterIO* poRasterIO, const
 
     const std::unique_ptr<IChannelInfo> oFirst(poDataset->GetChannelInfo(oChannels.front()));
     Require(oFirst != nullptr, "The dataset gave no description of the first channel", oPlace);
-    mpoChannels->Commit(detail::OpenRasterIO(std::move(oRasterIO), oFirst->GetDataType(), oPlace));
+    Commit(detail::OpenRasterIO(std::move(oRasterIO), oFirst->GetDataType(), oPlace));
     SetDataset(poRoot, oChannels, false);
 }
 
@@ -169,8 +169,8 @@ IRasterDataset* BasicWriter::RDSIf(const std::string& fileName)
 
 void BasicWriter::Init()
 {
-    mpoChannels->Commit(detail::OpenedChannels());
-    mpoChannels->SetMargins(0, 0, eMirror, Place::Current());
+    Commit(detail::OpenedChannels());
+    KeepMargins(0, 0, eMirror);
 }
 
 void BasicWriter::OpenDataset(bool bBitmaps)
@@ -197,8 +197,8 @@ void BasicWriter::OpenDataset(bool bBitmaps)
         Require(!oChannels.empty(), "No channels selected to write", oPlace);
         oOpened = detail::OpenChannels(oRasterDataset, oChannels, nullptr, oPlace);
     }
+    Commit(std::move(oOpened));
     mpoChannels->SetChannels(std::move(oChannels));
-    mpoChannels->Commit(std::move(oOpened));
     SetOptimalTileSize(); // virtual: a derived writer may choose its own
 }
 
@@ -217,7 +217,7 @@ void BasicWriter::OpenDatasetOrCleanup(bool bBitmaps)
 
 void BasicWriter::CleanupDataset()
 {
-    mpoChannels->Commit(detail::OpenedChannels());
+    Commit(detail::OpenedChannels());
     mpoChannels->DropOwnedDataset();
 }
 
@@ -244,18 +244,13 @@ void BasicWriter::OpenForWriting()
 krv::gobs::Raster* BasicWriter::GetRaster(unsigned int nIndex)
 {
     LazyOpen();
-    std::unique_ptr<krv::gobs::Raster> oRaster =
-        detail::MakeRaster(*this, mpoChannels->GetOpened().moGrid.GetTiles().GetTile(nIndex), Place::Current());
-    ReadRaster(oRaster.get());
-    return oRaster.release();
+    return RasterAccess::GetRaster(nIndex);
 }
 
 krv::gobs::Raster* BasicWriter::ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight)
 {
     LazyOpen();
-    std::unique_ptr<krv::gobs::Raster> oRaster = detail::MakeRaster(*this, {nX, nY, nWidth, nHeight}, Place::Current());
-    ReadRaster(oRaster.get());
-    return oRaster.release();
+    return RasterAccess::ReadRaster(nX, nY, nWidth, nHeight);
 }
 
 void BasicWriter::ReadRaster(krv::gobs::Raster* poRaster)
@@ -263,17 +258,17 @@ void BasicWriter::ReadRaster(krv::gobs::Raster* poRaster)
     const Place oPlace = Place::Current();
     LazyOpen();
     krv::gobs::CheckRasterCompatible(poRaster, this, oPlace);
-    mpoChannels->Read(*poRaster, oPlace);
+    mpoChannels->Read(*poRaster, GetMarginBehaviour(), oPlace);
 }
 
 void BasicWriter::FillMargins(krv::gobs::Raster* poRaster)
 {
-    mpoChannels->FillMargins(*poRaster, Place::Current());
+    mpoChannels->FillMargins(*poRaster, GetMarginBehaviour(), Place::Current());
 }
 
 void BasicWriter::SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour)
 {
-    mpoChannels->SetMargins(nXMargin, nYMargin, eBehaviour, Place::Current());
+    SetLimitedMargins(nXMargin, nYMargin, eBehaviour, Place::Current());
 }
 
 // No look at the I/O here, intended: a writer of a level or of bitmaps still reaches the levels of its dataset.
