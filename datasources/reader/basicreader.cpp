@@ -25,18 +25,11 @@ std::unique_ptr<IDataset> OpenForReading(const std::string& fileName)
     return std::unique_ptr<IDataset>(DatasetManager::GetInstance()->Open(fileName, eReadOnly));
 }
 
-IRasterDataset& RequireRaster(IDataset* poDataset, const std::string& message, const Place& oPlace)
-{
-    auto* const poRasterDataset = dynamic_cast<IRasterDataset*>(poDataset);
-    if (poRasterDataset == nullptr)
-        throw krv::DataException(message, oPlace);
-    return *poRasterDataset;
-}
-
 IRasterDataset& RequireRasterFile(const std::unique_ptr<IDataset>& oDataset, const std::string& fileName,
                                   const Place& oPlace)
 {
-    return RequireRaster(oDataset.get(), "Format does not support rasters: file=" + fileName, oPlace);
+    return detail::RequireFacet<IRasterDataset>(oDataset.get(), "Format does not support rasters: file=" + fileName,
+                                                oPlace);
 }
 
 const std::vector<unsigned int>& RequireChannels(const std::vector<unsigned int>& oChannels, const std::string& message,
@@ -114,7 +107,8 @@ BasicReader::BasicReader(IDataset* poDataset, const std::vector<unsigned int>& o
     const Place oPlace = Place::Current();
     if (poDataset == nullptr)
         throw krv::DataException("The dataset is NULL", oPlace);
-    const auto& oRasterDataset = RequireRaster(poDataset, "This dataset doesn't support Raster.", oPlace);
+    const auto& oRasterDataset =
+        detail::RequireFacet<IRasterDataset>(poDataset, "This dataset doesn't support Raster.", oPlace);
     UseChannels(poDataset, Available(oRasterDataset, oChannels, oPlace), nullptr, oPlace);
     mpoChannels->SetOwned(bTakeOwnership);
 }

@@ -27,6 +27,8 @@ namespace krv::datasources
 namespace
 {
 
+constexpr const char* NO_RASTER = "This Dataset doesn't supports Raster.";
+
 // Channels of one data type, read together.
 struct Group
 {
@@ -168,8 +170,7 @@ void MultiTypeReader::OpenFile(const std::string& fileName, const std::vector<un
     if (oChannels.empty())
         throw krv::DataException("Channels list is empty", oPlace);
     std::unique_ptr<IDataset> oDataset(DatasetManager::GetInstance()->Open(fileName, eReadOnly));
-    if (dynamic_cast<IRasterDataset*>(oDataset.get()) == nullptr)
-        throw krv::DataException("Format does not support rasters: file=" + fileName, oPlace);
+    detail::RequireFacet<IRasterDataset>(oDataset.get(), "Format does not support rasters: file=" + fileName, oPlace);
     UseDataset({oDataset.release(), {true}}, oChannels, ePlacement, oPlace);
 }
 
@@ -179,9 +180,7 @@ void MultiTypeReader::UseDataset(OwnedOrBorrowed<IDataset> oDataset, const std::
     if (oChannels.empty())
         throw krv::DataException("Channels list is empty", oPlace);
     IDataset* const poDataset = oDataset.get();
-    auto* const poRasterDataset = dynamic_cast<IRasterDataset*>(poDataset);
-    if (poRasterDataset == nullptr)
-        throw krv::DataException("This Dataset doesn't supports Raster.", oPlace);
+    const auto& oRasters = detail::RequireFacet<IRasterDataset>(poDataset, NO_RASTER, oPlace);
     mpoState->mpoDataset = std::move(oDataset);
     mpoState->moChannels = oChannels;
     mpoState->mePlacement = ePlacement;
@@ -194,7 +193,7 @@ void MultiTypeReader::UseDataset(OwnedOrBorrowed<IDataset> oDataset, const std::
     std::map<krv::gobs::DataType, Members> oByType;
     for (unsigned int nPosition = 0; nPosition < oChannels.size(); ++nPosition)
     {
-        std::unique_ptr<IChannelInfo> oInfo(poRasterDataset->GetChannelInfo(oChannels[nPosition]));
+        std::unique_ptr<IChannelInfo> oInfo(oRasters.GetChannelInfo(oChannels[nPosition]));
         if (oInfo == nullptr)
             throw krv::DataException(
                 "The dataset gave no description of channel " + std::to_string(oChannels[nPosition]), oPlace);
@@ -221,9 +220,7 @@ void MultiTypeReader::UseReaders(IDataset* poDataset, const std::vector<IRasterR
 
     if (oChannels.empty())
         throw krv::DataException("Channels list is empty", oPlace);
-    auto* const poRasterDataset = dynamic_cast<IRasterDataset*>(poDataset);
-    if (poRasterDataset == nullptr)
-        throw krv::DataException("This Dataset doesn't supports Raster.", oPlace);
+    detail::RequireFacet<IRasterDataset>(poDataset, NO_RASTER, oPlace);
     if (oReaders.size() != oChannels.size())
         throw krv::DataException("Number of readers should the same as the number of channels", oPlace);
     for (const Group& oGroup : oGroups)

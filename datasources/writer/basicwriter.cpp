@@ -19,7 +19,6 @@
 #include "toolkit/core/core.h"
 #include "toolkit/exceptions/exceptions.h"
 
-#include <numeric>
 #include <utility>
 
 namespace krv::datasources
@@ -28,19 +27,12 @@ namespace krv::datasources
 namespace
 {
 
+using detail::RequireFacet;
+
 std::string FormatName(const IDataset& oDataset)
 {
     const IFileFormat* const poFormat = oDataset.GetFileFormat();
     return poFormat != nullptr ? poFormat->GetShortName() : std::string();
-}
-
-template <typename Facet>
-Facet& RequireFacet(IDataset* poDataset, const std::string& message, const Place& oPlace)
-{
-    auto* const poFacet = dynamic_cast<Facet*>(poDataset);
-    if (poFacet == nullptr)
-        throw krv::DataException(message, oPlace);
-    return *poFacet;
 }
 
 void Require(bool bCondition, const char* pMessage, const Place& oPlace)
@@ -299,15 +291,11 @@ void BasicWriter::CreateNewFile(const krv::gobs::RasterInfo& oInfo)
     auto& oRasterDataset = RequireFacet<IRasterDataset>(
         poDataset, "Format does not support rasters: format=" + FormatName(*poDataset), oPlace);
     Require(!poDataset->Exists(), "The dataset already exists", oPlace);
-    std::vector<unsigned int> oChannels = GetChannels();
+    const std::vector<unsigned int>& oChannels = GetChannels();
     Require(oChannels.empty() || oChannels.size() == oInfo.GetChansCount(),
             "The RasterInfo does not match the write channels of this writer", oPlace);
     if (oChannels.empty())
-    {
-        oChannels.resize(oInfo.GetChansCount());
-        std::iota(oChannels.begin(), oChannels.end(), 1u);
-        mpoChannels->SetChannels(std::move(oChannels));
-    }
+        mpoChannels->SetChannels(detail::FirstChannels(oInfo.GetChansCount()));
     oRasterDataset.Create(oInfo);
     OpenDataset(false);
 }

@@ -8,11 +8,11 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/raster/raster.h"
-#include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 
 #include <cstring>
 #include <limits>
+#include <numeric>
 
 namespace krv::datasources::detail
 {
@@ -115,13 +115,16 @@ OpenedChannels OpenRasterIO(std::unique_ptr<IRasterIO> oRasterIO, const krv::gob
     return oOpened;
 }
 
+std::vector<unsigned int> FirstChannels(unsigned int nCount)
+{
+    std::vector<unsigned int> oChannels(nCount);
+    std::iota(oChannels.begin(), oChannels.end(), 1u);
+    return oChannels;
+}
+
 std::vector<unsigned int> AllChannels(const IRasterDataset& oDataset)
 {
-    std::vector<unsigned int> oChannels;
-    const unsigned int nCount = oDataset.GetChanCount();
-    for (unsigned int nChannel = 1; nChannel <= nCount && nChannel != 0; ++nChannel)
-        oChannels.push_back(nChannel);
-    return oChannels;
+    return FirstChannels(oDataset.GetChanCount());
 }
 
 AuxiliaryData SelectChannelData(IDataset& oDataset, const std::vector<unsigned int>& oChannels)

@@ -5,9 +5,10 @@
 #include "gobs/raster/datatype.h"
 #include "gobs/raster/margins.h"
 #include "toolkit/core/ownedorborrowed.h"
-#include "toolkit/exceptions/place.h"
+#include "toolkit/exceptions/exceptions.h"
 
 #include <memory>
+#include <string>
 #include <utility>
 #include <vector>
 
@@ -71,7 +72,18 @@ OpenedChannels OpenBitmaps(IBitmapDataset& oDataset, const std::vector<unsigned 
 OpenedChannels OpenRasterIO(std::unique_ptr<IRasterIO> oRasterIO, const krv::gobs::DataType& oType,
                             const Place& oPlace);
 
-// 1, 2, ... the dataset's channel count
+// The facet of a dataset. Throws DataException with the message for null and for one without the facet.
+template <typename Facet>
+Facet& RequireFacet(IDataset* poDataset, const std::string& message, const Place& oPlace)
+{
+    auto* const poFacet = dynamic_cast<Facet*>(poDataset);
+    if (poFacet == nullptr)
+        throw krv::DataException(message, oPlace);
+    return *poFacet;
+}
+
+// 1, 2, ... the count, and the dataset's channel count
+std::vector<unsigned int> FirstChannels(unsigned int nCount);
 std::vector<unsigned int> AllChannels(const IRasterDataset& oDataset);
 
 // The file metadata of a dataset, and metadata and descriptions of the listed channels in the order of the list.
