@@ -25,18 +25,11 @@ std::unique_ptr<IDataset> OpenForReading(const std::string& fileName)
     return std::unique_ptr<IDataset>(DatasetManager::GetInstance()->Open(fileName, eReadOnly));
 }
 
-IRasterDataset& RequireRaster(IDataset* poDataset, const std::string& message, const Place& oPlace)
-{
-    auto* const poRasterDataset = dynamic_cast<IRasterDataset*>(poDataset);
-    if (poRasterDataset == nullptr)
-        throw krv::DataException(message, oPlace);
-    return *poRasterDataset;
-}
-
 IRasterDataset& RequireRasterFile(const std::unique_ptr<IDataset>& oDataset, const std::string& fileName,
                                   const Place& oPlace)
 {
-    return RequireRaster(oDataset.get(), "Format does not support rasters: file=" + fileName, oPlace);
+    return detail::RequireFacet<IRasterDataset>(oDataset.get(), "Format does not support rasters: file=" + fileName,
+                                                oPlace);
 }
 
 const std::vector<unsigned int>& RequireChannels(const std::vector<unsigned int>& oChannels, const std::string& message,
@@ -105,7 +98,7 @@ BasicReader::BasicReader(IBitmapDataset* poDataset, const std::vector<unsigned i
     const auto oChannels = oBitmaps.empty() ? poDataset->GetBitmapList() : oBitmaps;
     RequireChannels(oChannels, "Bitmap list is empty", oPlace);
     mpoChannels->SetBitmaps();
-    mpoChannels->Commit(detail::OpenBitmaps(*poDataset, oChannels, oPlace));
+    Commit(detail::OpenBitmaps(*poDataset, oChannels, oPlace));
     SetDataset(poRoot, oChannels, bTakeOwnership);
 }
 
@@ -114,7 +107,8 @@ BasicReader::BasicReader(IDataset* poDataset, const std::vector<unsigned int>& o
     const Place oPlace = Place::Current();
     if (poDataset == nullptr)
         throw krv::DataException("The dataset is NULL", oPlace);
-    const auto& oRasterDataset = RequireRaster(poDataset, "This dataset doesn't support Raster.", oPlace);
+    const auto& oRasterDataset =
+        detail::RequireFacet<IRasterDataset>(poDataset, "This dataset doesn't support Raster.", oPlace);
     UseChannels(poDataset, Available(oRasterDataset, oChannels, oPlace), nullptr, oPlace);
     mpoChannels->SetOwned(bTakeOwnership);
 }
@@ -140,7 +134,7 @@ void BasicReader::UseChannels(IDataset* poDataset, const std::vector<unsigned in
                               std::unique_ptr<IRasterIO> oRasterIO, const Place& oPlace)
 {
     auto& oRasterDataset = dynamic_cast<IRasterDataset&>(*poDataset);
-    mpoChannels->Commit(detail::OpenChannels(oRasterDataset, oChannels, std::move(oRasterIO), oPlace));
+    Commit(detail::OpenChannels(oRasterDataset, oChannels, std::move(oRasterIO), oPlace));
     SetDataset(poDataset, oChannels, false);
 }
 
@@ -152,36 +146,21 @@ void BasicReader::UseFile(std::unique_ptr<IDataset> oDataset, const std::vector<
     static_cast<void>(oDataset.release());
 }
 
-krv::gobs::Raster* BasicReader::GetRaster(unsigned int nIndex)
-{
-    std::unique_ptr<krv::gobs::Raster> oRaster =
-        detail::MakeRaster(*this, mpoChannels->GetOpened().moGrid.GetTiles().GetTile(nIndex), Place::Current());
-    ReadRaster(oRaster.get()); // virtual: a derived reader fills its own way
-    return oRaster.release();
-}
-
-krv::gobs::Raster* BasicReader::ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight)
-{
-    std::unique_ptr<krv::gobs::Raster> oRaster = detail::MakeRaster(*this, {nX, nY, nWidth, nHeight}, Place::Current());
-    ReadRaster(oRaster.get());
-    return oRaster.release();
-}
-
 void BasicReader::ReadRaster(krv::gobs::Raster* poRaster)
 {
     const Place oPlace = Place::Current();
     krv::gobs::CheckRasterCompatible(poRaster, this, oPlace);
-    mpoChannels->Read(*poRaster, oPlace);
+    mpoChannels->Read(*poRaster, GetMarginBehaviour(), oPlace);
 }
 
 void BasicReader::FillMargins(krv::gobs::Raster* poRaster)
 {
-    mpoChannels->FillMargins(*poRaster, Place::Current());
+    mpoChannels->FillMargins(*poRaster, GetMarginBehaviour(), Place::Current());
 }
 
 void BasicReader::SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour)
 {
-    mpoChannels->SetMargins(nXMargin, nYMargin, eBehaviour, Place::Current());
+    SetLimitedMargins(nXMargin, nYMargin, eBehaviour, Place::Current());
 }
 
 IOverviewReaderAccessor* BasicReader::GetOverviewReaderAccessor()

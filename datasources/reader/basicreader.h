@@ -43,10 +43,9 @@ public:
 
     ~BasicReader() override;
 
-    krv::gobs::Raster* GetRaster(unsigned int nIndex) override;
     void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour) override;
+    using RasterAccess::ReadRaster;
     void ReadRaster(krv::gobs::Raster* poRaster) override;
-    krv::gobs::Raster* ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight) override;
     IOverviewReaderAccessor* GetOverviewReaderAccessor() override;
 
 protected:
@@ -57,6 +56,8 @@ protected:
     void FillMargins(krv::gobs::Raster* poRaster);
 
 private:
+    friend class ExactHaloReader; // which makes the margins itself
+
     // The dataset is borrowed until everything is open.
     void UseChannels(IDataset* poDataset, const std::vector<unsigned int>& oChannels,
                      std::unique_ptr<IRasterIO> oRasterIO, const krv::Place& oPlace);

@@ -2,18 +2,19 @@
 
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/metadata/typednodata.h"
+#include "datasources/reader/basicreader.h"
 #include "datasources/reader/checkrastercompatible.h"
 #include "datasources/reader/detail/rasterchannels.h"
-#include "datasources/reader/ioverviewaccessor.h"
-#include "datasources/reader/rasteriterator.h"
 #include "gobs/mask/samplematch.h"
 #include "gobs/raster/buffertype.h"
 #include "gobs/raster/raster.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
+#include <climits>
 #include <cstring>
 #include <optional>
+#include <typeinfo>
 
 namespace krv::datasources
 {
@@ -21,23 +22,73 @@ namespace krv::datasources
 namespace
 {
 
-constexpr long long OUTSIDE = -1;
-
-// For each of nCount positions from nBegin on a line of nLength pixels: the pixel that stands for it, or OUTSIDE.
-std::vector<long long> MakeIndices(long long nBegin, std::uint64_t nCount, unsigned int nLength,
-                                   eMarginBehaviour eBehaviour)
+// One direction of a raster with its margins, held against the image.
+struct Axis
 {
-    const bool bValue = eBehaviour == eConstant || eBehaviour == eNoData;
-    std::vector<long long> oIndices(nCount);
-    for (std::uint64_t nAt = 0; nAt < nCount; ++nAt)
+    Axis(int nPosition, unsigned int nMargin, std::uint64_t nCount, unsigned int nLength)
+        : mnBegin(static_cast<long long>(nPosition) - nMargin), mnCount(static_cast<long long>(nCount)),
+          mnLength(nLength), mnBefore(std::clamp(-mnBegin, 0LL, mnCount)),
+          mnBehind(std::clamp(mnBegin + mnCount - mnLength, 0LL, mnCount)),
+          mnInside(std::max(0LL, mnCount - mnBefore - mnBehind))
     {
-        const long long nIndex = nBegin + static_cast<long long>(nAt);
-        if (nIndex >= 0 && nIndex < static_cast<long long>(nLength))
-            oIndices[nAt] = nIndex;
-        else
-            oIndices[nAt] = bValue ? OUTSIDE : krv::gobs::FoldIndex(nIndex, nLength, eBehaviour);
     }
+
+    bool IsInside() const { return mnBegin >= 0 && mnBegin + mnCount <= mnLength; }
+    bool IsInt() const { return mnBegin >= INT_MIN && mnBegin + mnCount <= INT_MAX && mnCount <= INT_MAX; }
+    // Whether the pixels that stand for those outside the image are among those inside.
+    bool HasSources(eMarginBehaviour eBehaviour) const
+    {
+        const long long nReach = std::max(mnBefore, mnBehind);
+        return mnInside > 0 &&
+               (nReach == 0 || mnInside == mnLength || eBehaviour == eReplicate ||
+                (eBehaviour == eMirror && nReach <= mnInside) || (eBehaviour == eMirror101 && nReach < mnInside));
+    }
+
+    long long mnBegin; // in the image
+    long long mnCount;
+    long long mnLength; // of the image
+    long long mnBefore; // positions outside the image
+    long long mnBehind;
+    long long mnInside;
+};
+
+Axis ColumnsOf(const krv::gobs::Raster& oRaster, const IRasterReader& oReader)
+{
+    return {oRaster.GetX(), oRaster.GetXMargin(), oRaster.GetFullWidth(), oReader.GetWidth()};
+}
+
+Axis RowsOf(const krv::gobs::Raster& oRaster, const IRasterReader& oReader)
+{
+    return {oRaster.GetY(), oRaster.GetYMargin(), oRaster.GetFullHeight(), oReader.GetHeight()};
+}
+
+// For each position the pixel of the image that stands for it.
+std::vector<long long> MakeIndices(const Axis& oAxis, eMarginBehaviour eBehaviour)
+{
+    std::vector<long long> oIndices(static_cast<std::size_t>(oAxis.mnCount));
+    for (std::size_t nAt = 0; nAt < oIndices.size(); ++nAt)
+        oIndices[nAt] = krv::gobs::FoldIndex(oAxis.mnBegin + static_cast<long long>(nAt), oAxis.mnLength, eBehaviour);
     return oIndices;
+}
+
+// Puts one pixel wherever the raster lies outside the image.
+void FillOutside(krv::gobs::Raster& oRaster, const Axis& oColumns, const Axis& oRows,
+                 const std::vector<unsigned char>& oPixel)
+{
+    const auto nRowBytes = static_cast<std::size_t>(oColumns.mnCount) * oPixel.size();
+    const auto nLeftBytes = static_cast<std::size_t>(oColumns.mnBefore) * oPixel.size();
+    const auto nRightBytes = static_cast<std::size_t>(oColumns.mnBehind) * oPixel.size();
+    std::vector<unsigned char> oLine;
+    oLine.reserve(nRowBytes);
+    while (oLine.size() < nRowBytes)
+        oLine.insert(oLine.end(), oPixel.begin(), oPixel.end());
+    unsigned char* pRow = oRaster.GetBuffer();
+    for (long long nRow = 0; nRow < oRows.mnCount; ++nRow, pRow += nRowBytes)
+    {
+        const bool bInside = nRow >= oRows.mnBefore && nRow < oRows.mnCount - oRows.mnBehind;
+        std::copy_n(oLine.begin(), bInside ? nLeftBytes : nRowBytes, pRow);
+        std::copy_n(oLine.begin(), nRightBytes, pRow + nRowBytes - nRightBytes);
+    }
 }
 
 struct Span
@@ -55,8 +106,6 @@ std::vector<Span> MakeSpans(std::vector<long long> oIndices)
     std::vector<Span> oSpans;
     for (const long long nIndex : oIndices)
     {
-        if (nIndex == OUTSIDE)
-            continue;
         const auto nPixel = static_cast<unsigned int>(nIndex);
         if (!oSpans.empty() && oSpans.back().mnEnd == nPixel)
             ++oSpans.back().mnEnd;
@@ -94,20 +143,20 @@ void CopyRow(const unsigned char* pSource, const Span& oColumns, unsigned char* 
 
 } // namespace
 
-ExactHaloReader::ExactHaloReader(IRasterReader* poSource, bool bTakeOwnership) : mpoSource(poSource), moTiles(0, 0)
+ExactHaloReader::ExactHaloReader(IRasterReader* poSource, bool bTakeOwnership)
 {
     if (poSource == nullptr)
         throw krv::DataException("The source reader is NULL");
-    if (poSource->GetWidth() == 0 || poSource->GetHeight() == 0)
+    const IRasterReader& oSource = *poSource;
+    if (oSource.GetWidth() == 0 || oSource.GetHeight() == 0)
         throw krv::DataException("The source reader has no pixels");
-    if (poSource->GetDataType().GetValueBits() % 8 != 0)
-        throw krv::DataException("The source reader has the data type " + poSource->GetDataType().Describe() +
+    if (oSource.GetDataType().GetValueBits() % 8 != 0)
+        throw krv::DataException("The source reader has the data type " + oSource.GetDataType().Describe() +
                                  ", which has no whole bytes");
-    mnPixelBytes = poSource->GetDataType().GetValueBits() / 8 * poSource->GetChansCount();
-    moTiles = krv::gobs::TileIterator(poSource->GetWidth(), poSource->GetHeight());
-    ExactHaloReader::SetOptimalTileSize();
-    if (bTakeOwnership)
-        mpoOwnedSource.reset(poSource);
+    mnPixelBytes = oSource.GetDataType().GetValueBits() / 8 * oSource.GetChansCount();
+    if (typeid(oSource) == typeid(BasicReader))
+        mpoPlainSource = dynamic_cast<BasicReader*>(poSource);
+    SetSource({poSource, {bTakeOwnership}});
 }
 
 ExactHaloReader::~ExactHaloReader() = default;
@@ -124,66 +173,79 @@ void ExactHaloReader::SetMargins(unsigned int nXMargin, unsigned int nYMargin, e
 {
     if (eBehaviour < eException || eBehaviour > eWrap)
         throw krv::ParameterException("Unknown margin behaviour", krv::ParameterException::eInvalidValue, "eBehaviour");
-    meMarginBehaviour = eBehaviour;
-    mnXMargin = nXMargin;
-    mnYMargin = nYMargin;
+    KeepMargins(nXMargin, nYMargin, eBehaviour);
 }
 
-krv::gobs::Raster* ExactHaloReader::GetRaster(unsigned int nIndex)
+LevelWrapper ExactHaloReader::GetLevelWrapper() const
 {
-    const krv::gobs::Tile oTile = moTiles.GetTile(nIndex);
-    return ReadRaster(oTile.GetX(), oTile.GetY(), oTile.GetWidth(), oTile.GetHeight());
-}
-
-krv::gobs::Raster* ExactHaloReader::ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth,
-                                               unsigned int nHeight)
-{
-    const Place oPlace = Place::Current();
-    auto oRaster = std::make_unique<krv::gobs::Raster>(
-        krv::gobs::RasterInfo(nWidth, nHeight, GetChansCount(), GetDataType()),
-        krv::gobs::RasterContext(detail::ToPosition(nX, oPlace), detail::ToPosition(nY, oPlace), mnXMargin, mnYMargin));
-    ReadRaster(oRaster.get());
-    return oRaster.release();
+    return [](std::unique_ptr<IRasterReader> poLevel)
+    {
+        auto oReader = std::make_unique<ExactHaloReader>(poLevel.get(), true);
+        static_cast<void>(poLevel.release());
+        return oReader;
+    };
 }
 
 void ExactHaloReader::ReadRaster(krv::gobs::Raster* poRaster)
 {
     const Place oPlace = Place::Current();
     krv::gobs::CheckRasterCompatible(poRaster, this, oPlace);
-    const long long nLeft = static_cast<long long>(poRaster->GetX()) - poRaster->GetXMargin();
-    const long long nTop = static_cast<long long>(poRaster->GetY()) - poRaster->GetYMargin();
-    const bool bInside = nLeft >= 0 && nTop >= 0 &&
-                         nLeft + static_cast<long long>(poRaster->GetFullWidth()) <= GetWidth() &&
-                         nTop + static_cast<long long>(poRaster->GetFullHeight()) <= GetHeight();
-    if (bInside)
-    {
-        // The same buffer as one window without margins: the source reads straight into it.
-        krv::gobs::Raster oWhole(
-            krv::gobs::RasterInfo(static_cast<unsigned int>(poRaster->GetFullWidth()),
-                                  static_cast<unsigned int>(poRaster->GetFullHeight()), GetChansCount(), GetDataType()),
-            krv::gobs::RasterContext(static_cast<int>(nLeft), static_cast<int>(nTop)), poRaster->GetBuffer(), false);
-        mpoSource->ReadRaster(&oWhole);
-        return;
-    }
-    if (meMarginBehaviour == eException)
+    const eMarginBehaviour eBehaviour = GetMarginBehaviour();
+    const Axis oColumns = ColumnsOf(*poRaster, *this);
+    const Axis oRows = RowsOf(*poRaster, *this);
+    if (oColumns.IsInside() && oRows.IsInside())
+        return ReadInside(*poRaster);
+    if (eBehaviour == eException)
         throw krv::DataException("Margin behaviour is eException", oPlace);
-    ReadAcrossBorder(*poRaster);
-}
-
-void ExactHaloReader::ReadAcrossBorder(krv::gobs::Raster& oRaster)
-{
-    const std::uint64_t nFullWidth = oRaster.GetFullWidth();
-    const auto oColumns = MakeIndices(static_cast<long long>(oRaster.GetX()) - oRaster.GetXMargin(), nFullWidth,
-                                      GetWidth(), meMarginBehaviour);
-    const auto oRows = MakeIndices(static_cast<long long>(oRaster.GetY()) - oRaster.GetYMargin(),
-                                   oRaster.GetFullHeight(), GetHeight(), meMarginBehaviour);
-    const std::size_t nRowBytes = nFullWidth * mnPixelBytes;
-    if (meMarginBehaviour == eConstant || meMarginBehaviour == eNoData)
+    if (eBehaviour == eConstant || eBehaviour == eNoData)
     {
         const std::vector<unsigned char> oPixel = MakeOutsidePixel();
-        for (std::uint64_t nPixel = 0; nPixel < nFullWidth * oRaster.GetFullHeight(); ++nPixel)
-            std::memcpy(oRaster.GetBuffer() + nPixel * mnPixelBytes, oPixel.data(), mnPixelBytes);
+        if (oColumns.mnInside > 0 && oRows.mnInside > 0)
+            ReadInside(*poRaster);
+        return FillOutside(*poRaster, oColumns, oRows, oPixel);
     }
+    if (!oColumns.HasSources(eBehaviour) || !oRows.HasSources(eBehaviour))
+        return ReadScattered(*poRaster);
+    ReadInside(*poRaster);
+    krv::gobs::FillRasterSides(*poRaster, eBehaviour, static_cast<std::uint64_t>(oColumns.mnBefore),
+                               static_cast<std::uint64_t>(oColumns.mnBehind),
+                               static_cast<std::uint64_t>(oRows.mnBefore), static_cast<std::uint64_t>(oRows.mnBehind));
+}
+
+// What lies in the image, as one window. It comes straight into the raster when it is all of the raster's rows, and
+// from a plain source in any case.
+void ExactHaloReader::ReadInside(krv::gobs::Raster& oRaster)
+{
+    const Axis oColumns = ColumnsOf(oRaster, *this);
+    const Axis oRows = RowsOf(oRaster, *this);
+    if (!oColumns.IsInside() && mpoPlainSource != nullptr && oColumns.IsInt() && oRows.IsInt())
+        return mpoPlainSource->mpoChannels->ReadInside(oRaster, Place::Current());
+    const auto nRowBytes = static_cast<std::size_t>(oColumns.mnCount) * mnPixelBytes;
+    unsigned char* const pFirst = oRaster.GetBuffer() + static_cast<std::size_t>(oRows.mnBefore) * nRowBytes;
+    const krv::gobs::RasterInfo oInfo(static_cast<unsigned int>(oColumns.mnInside),
+                                      static_cast<unsigned int>(oRows.mnInside), GetChansCount(), GetDataType());
+    const krv::gobs::RasterContext oContext(static_cast<int>(std::max(0LL, oColumns.mnBegin)),
+                                            static_cast<int>(std::max(0LL, oRows.mnBegin)));
+    if (oColumns.IsInside())
+    {
+        krv::gobs::Raster oPart(oInfo, oContext, pFirst, false);
+        return GetSource().ReadRaster(&oPart);
+    }
+    krv::gobs::Raster oPart(oInfo, oContext);
+    GetSource().ReadRaster(&oPart);
+    const std::size_t nPartBytes = oPart.GetFullWidth() * mnPixelBytes;
+    for (std::size_t nRow = 0; nRow < oPart.GetFullHeight(); ++nRow)
+        std::memcpy(pFirst + nRow * nRowBytes + static_cast<std::size_t>(oColumns.mnBefore) * mnPixelBytes,
+                    oPart.GetBuffer() + nRow * nPartBytes, nPartBytes);
+}
+
+// Patches of the image, each read once, of which every pixel takes the one that stands for it: when margins are wide
+// beside the window, or pixels come from the other end of the image.
+void ExactHaloReader::ReadScattered(krv::gobs::Raster& oRaster)
+{
+    const auto oColumns = MakeIndices(ColumnsOf(oRaster, *this), GetMarginBehaviour());
+    const auto oRows = MakeIndices(RowsOf(oRaster, *this), GetMarginBehaviour());
+    const std::size_t nRowBytes = oColumns.size() * mnPixelBytes;
     for (const Span& oRowSpan : MakeSpans(oRows))
     {
         for (const Span& oColumnSpan : MakeSpans(oColumns))
@@ -192,7 +254,7 @@ void ExactHaloReader::ReadAcrossBorder(krv::gobs::Raster& oRaster)
                 krv::gobs::RasterInfo(oColumnSpan.mnEnd - oColumnSpan.mnBegin, oRowSpan.mnEnd - oRowSpan.mnBegin,
                                       GetChansCount(), GetDataType()),
                 krv::gobs::RasterContext(static_cast<int>(oColumnSpan.mnBegin), static_cast<int>(oRowSpan.mnBegin)));
-            mpoSource->ReadRaster(&oPatch);
+            GetSource().ReadRaster(&oPatch);
             const std::size_t nPatchRowBytes = oPatch.GetFullWidth() * mnPixelBytes;
             for (std::size_t nRow = 0; nRow < oRows.size(); ++nRow)
             {
@@ -212,11 +274,11 @@ std::vector<unsigned char> ExactHaloReader::MakeOutsidePixel() const
     const krv::gobs::DataType& oType = GetDataType();
     const unsigned int nChannels = GetChansCount();
     std::vector<unsigned char> oPixel(mnPixelBytes);
-    const AuxiliaryData oMetadata = meMarginBehaviour == eNoData ? GetAuxiliaryData() : AuxiliaryData();
+    const AuxiliaryData oMetadata = GetMarginBehaviour() == eNoData ? GetAuxiliaryData() : AuxiliaryData();
     for (unsigned int nChannel = 0; nChannel < nChannels; ++nChannel)
     {
         unsigned char* const pValue = oPixel.data() + mnPixelBytes / nChannels * nChannel;
-        if (meMarginBehaviour == eConstant)
+        if (GetMarginBehaviour() == eConstant)
         {
             const double nConstant = moConstant.empty() ? 0 : moConstant[nChannel];
             krv::raster::CopyData(&nConstant, krv::raster::eBT_64R, 1, pValue,
@@ -233,88 +295,6 @@ std::vector<unsigned char> ExactHaloReader::MakeOutsidePixel() const
                                      " for the pixels outside the image");
     }
     return oPixel;
-}
-
-RasterIterator ExactHaloReader::FindRaster(unsigned int nX, unsigned int nY)
-{
-    return RasterIterator(this, moTiles.GetTileIndex(nX, nY));
-}
-
-RasterIterator ExactHaloReader::Begin()
-{
-    return RasterIterator(this);
-}
-
-RasterIterator ExactHaloReader::End()
-{
-    return RasterIterator(this, GetTileCount());
-}
-
-unsigned int ExactHaloReader::GetTileCount() const
-{
-    return moTiles.GetTileRange() + 1;
-}
-
-void ExactHaloReader::SetOptimalTileSize()
-{
-    SetTileSize(mpoSource->GetTileWidth(), mpoSource->GetTileHeight());
-}
-
-void ExactHaloReader::SetTileSize(unsigned int nWidth, unsigned int nHeight)
-{
-    moTiles.SetChunkSize(nWidth, nHeight);
-    mnTileWidth = nWidth;
-    mnTileHeight = nHeight;
-}
-
-const std::vector<IChannelInfo*>& ExactHaloReader::GetChannelsInfo() const
-{
-    return mpoSource->GetChannelsInfo();
-}
-
-IFileFormat* ExactHaloReader::GetFileFormat() const
-{
-    return mpoSource->GetFileFormat();
-}
-
-AuxiliaryData ExactHaloReader::GetAuxiliaryData() const
-{
-    return mpoSource->GetAuxiliaryData();
-}
-
-krv::ogc::cs::ICRS* ExactHaloReader::GetCRS() const
-{
-    return mpoSource->GetCRS();
-}
-
-krv::ogc::cs::GeocodingInfo* ExactHaloReader::GetGeocodingInfo() const
-{
-    return mpoSource->GetGeocodingInfo();
-}
-
-IOverviewReaderAccessor* ExactHaloReader::GetOverviewReaderAccessor()
-{
-    return mpoSource->GetOverviewReaderAccessor();
-}
-
-unsigned int ExactHaloReader::GetWidth() const
-{
-    return mpoSource->GetWidth();
-}
-
-unsigned int ExactHaloReader::GetHeight() const
-{
-    return mpoSource->GetHeight();
-}
-
-unsigned int ExactHaloReader::GetChansCount() const
-{
-    return mpoSource->GetChansCount();
-}
-
-const krv::gobs::DataType& ExactHaloReader::GetDataType() const
-{
-    return mpoSource->GetDataType();
 }
 
 } // namespace krv::datasources

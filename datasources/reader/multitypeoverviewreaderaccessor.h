@@ -1,20 +1,18 @@
 #pragma once
 
-#include "datasources/reader/ioverviewaccessor.h"
+#include "datasources/reader/derived/derivedoverviewreaderaccessor.h"
 #include "gobs/raster/datatype.h"
 
-#include <memory>
 #include <vector>
 
 namespace krv::datasources
 {
 
-class BasicOverviewReaderAccessor;
 class IRasterDataset;
 
 // The levels of channels of different types, each read as one image of a type. Levels, validity and metadata are those
 // of BasicOverviewReaderAccessor. The dataset outlives the accessor, and the accessor every reader that it makes.
-class KRV_DATASOURCES_API MultiTypeOverviewReaderAccessor : public IOverviewReaderAccessor
+class KRV_DATASOURCES_API MultiTypeOverviewReaderAccessor : public DerivedOverviewReaderAccessor
 {
 public:
     // Throws DataException for a null dataset and an empty list.
@@ -22,16 +20,10 @@ public:
                                     const krv::gobs::DataType& oType);
     ~MultiTypeOverviewReaderAccessor() override;
 
-    std::vector<unsigned int> GetLevels() const override;
-    bool IsValid(unsigned int nChannel, unsigned int nLevel) const override;
-    bool IsLevelValid(unsigned int nLevel) const override;
-    AuxiliaryData GetAuxiliaryData(unsigned int nLevel) override;
-    unsigned int GetChanCount() const override;
     // A MultiTypeReader over one reader per channel, which places every channel at its own place.
     IRasterReader* CreateRasterReader(unsigned int nLevel) override;
 
 private:
-    std::unique_ptr<BasicOverviewReaderAccessor> mpoLevels;
     IRasterDataset* mpoRasterDataset; // borrowed
     std::vector<unsigned int> moReadChannels;
     krv::gobs::DataType moType;

@@ -8,7 +8,6 @@
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/detail/rasterchannels.h"
 #include "datasources/reader/multitypeoverviewreaderaccessor.h"
-#include "datasources/reader/rasteriterator.h"
 #include "gobs/raster/buffertype.h"
 #include "gobs/raster/raster.h"
 #include "toolkit/core/hblock.h"
@@ -27,6 +26,8 @@ namespace krv::datasources
 
 namespace
 {
+
+constexpr const char* NO_RASTER = "This Dataset doesn't supports Raster.";
 
 // Channels of one data type, read together.
 struct Group
@@ -66,9 +67,9 @@ krv::raster::MergeSource AsSource(const Group& oGroup)
 }
 
 // Does something with every group, so that all end in the same state, and when only some can, has the others undo it.
-// The first failure passes afterwards.
+// Returns the first failure.
 template <typename Operation, typename Undo>
-void InStep(const std::vector<Group>& oGroups, const Operation& oOperation, const Undo& oUndo)
+std::exception_ptr InStep(const std::vector<Group>& oGroups, const Operation& oOperation, const Undo& oUndo)
 {
     std::exception_ptr oFailure;
     std::size_t nFailed = 0;
@@ -85,11 +86,9 @@ void InStep(const std::vector<Group>& oGroups, const Operation& oOperation, cons
                 oFailure = std::current_exception();
         }
     }
-    if (oFailure == nullptr)
-        return;
-    for (std::size_t nGroup = 0; nGroup < oGroups.size() && nFailed < oGroups.size(); ++nGroup)
+    for (std::size_t nGroup = 0; nGroup < oGroups.size() && nFailed != 0 && nFailed < oGroups.size(); ++nGroup)
         oUndo(*oGroups[nGroup].mpoReader);
-    std::rethrow_exception(oFailure);
+    return oFailure;
 }
 
 } // namespace
@@ -101,14 +100,11 @@ struct MultiTypeReader::State
     State& operator=(const State&) = delete;
     ~State() { moGroups.clear(); } // before the dataset
 
-    IRasterReader& First() const { return *moGroups.front().mpoReader; }
-
     std::vector<Group> moGroups; // ascending by data type
     OwnedOrBorrowed<IDataset> mpoDataset;
     std::vector<unsigned int> moChannels;
     detail::ChannelInfos moInfos;
     krv::gobs::DataType moType;
-    krv::gobs::TileIterator moTiles{0, 0};
     eChannelPlacement mePlacement = eFromFirstPlace;
     bool mbOverviewsDisabled = false;               // the readers were ready-made
     std::unique_ptr<krv::raster::Merger> mpoMerger; // made by the first reading
@@ -174,8 +170,7 @@ void MultiTypeReader::OpenFile(const std::string& fileName, const std::vector<un
     if (oChannels.empty())
         throw krv::DataException("Channels list is empty", oPlace);
     std::unique_ptr<IDataset> oDataset(DatasetManager::GetInstance()->Open(fileName, eReadOnly));
-    if (dynamic_cast<IRasterDataset*>(oDataset.get()) == nullptr)
-        throw krv::DataException("Format does not support rasters: file=" + fileName, oPlace);
+    detail::RequireFacet<IRasterDataset>(oDataset.get(), "Format does not support rasters: file=" + fileName, oPlace);
     UseDataset({oDataset.release(), {true}}, oChannels, ePlacement, oPlace);
 }
 
@@ -185,9 +180,7 @@ void MultiTypeReader::UseDataset(OwnedOrBorrowed<IDataset> oDataset, const std::
     if (oChannels.empty())
         throw krv::DataException("Channels list is empty", oPlace);
     IDataset* const poDataset = oDataset.get();
-    auto* const poRasterDataset = dynamic_cast<IRasterDataset*>(poDataset);
-    if (poRasterDataset == nullptr)
-        throw krv::DataException("This Dataset doesn't supports Raster.", oPlace);
+    const auto& oRasters = detail::RequireFacet<IRasterDataset>(poDataset, NO_RASTER, oPlace);
     mpoState->mpoDataset = std::move(oDataset);
     mpoState->moChannels = oChannels;
     mpoState->mePlacement = ePlacement;
@@ -200,7 +193,7 @@ void MultiTypeReader::UseDataset(OwnedOrBorrowed<IDataset> oDataset, const std::
     std::map<krv::gobs::DataType, Members> oByType;
     for (unsigned int nPosition = 0; nPosition < oChannels.size(); ++nPosition)
     {
-        std::unique_ptr<IChannelInfo> oInfo(poRasterDataset->GetChannelInfo(oChannels[nPosition]));
+        std::unique_ptr<IChannelInfo> oInfo(oRasters.GetChannelInfo(oChannels[nPosition]));
         if (oInfo == nullptr)
             throw krv::DataException(
                 "The dataset gave no description of channel " + std::to_string(oChannels[nPosition]), oPlace);
@@ -227,9 +220,7 @@ void MultiTypeReader::UseReaders(IDataset* poDataset, const std::vector<IRasterR
 
     if (oChannels.empty())
         throw krv::DataException("Channels list is empty", oPlace);
-    auto* const poRasterDataset = dynamic_cast<IRasterDataset*>(poDataset);
-    if (poRasterDataset == nullptr)
-        throw krv::DataException("This Dataset doesn't supports Raster.", oPlace);
+    detail::RequireFacet<IRasterDataset>(poDataset, NO_RASTER, oPlace);
     if (oReaders.size() != oChannels.size())
         throw krv::DataException("Number of readers should the same as the number of channels", oPlace);
     for (const Group& oGroup : oGroups)
@@ -256,14 +247,14 @@ void MultiTypeReader::UseReaders(IDataset* poDataset, const std::vector<IRasterR
     Settle();
 }
 
-// The promoted type and one tile grid for the groups.
+// The promoted type and one tile grid for the groups; the first of them answers for size, place and format.
 void MultiTypeReader::Settle()
 {
     std::vector<krv::gobs::DataType> oTypes;
     for (const Group& oGroup : mpoState->moGroups)
         oTypes.push_back(oGroup.mpoReader->GetDataType());
     mpoState->moType = krv::gobs::PromoteType(oTypes);
-    mpoState->moTiles = krv::gobs::TileIterator(GetWidth(), GetHeight());
+    SetSource({mpoState->moGroups.front().mpoReader.get(), {}});
     MultiTypeReader::SetOptimalTileSize();
 }
 
@@ -286,24 +277,6 @@ void MultiTypeReader::WarnOfLoss(const krv::gobs::DataType& oType, const Place& 
                                   oPlace.GetSourceFile(), oPlace.GetLine());
 }
 
-krv::gobs::Raster* MultiTypeReader::GetRaster(unsigned int nIndex)
-{
-    const krv::gobs::Tile oTile = mpoState->moTiles.GetTile(nIndex);
-    return ReadRaster(oTile.GetX(), oTile.GetY(), oTile.GetWidth(), oTile.GetHeight());
-}
-
-krv::gobs::Raster* MultiTypeReader::ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth,
-                                               unsigned int nHeight)
-{
-    const Place oPlace = Place::Current();
-    const krv::gobs::RasterInfo oInfo(nWidth, nHeight, GetChansCount(), mpoState->moType);
-    const krv::gobs::RasterContext oContext(detail::ToPosition(nX, oPlace), detail::ToPosition(nY, oPlace),
-                                            GetXMargin(), GetYMargin());
-    auto oRaster = std::make_unique<krv::gobs::Raster>(oInfo, oContext);
-    ReadRaster(oRaster.get());
-    return oRaster.release();
-}
-
 void MultiTypeReader::ReadRaster(krv::gobs::Raster* poRaster)
 {
     if (poRaster == nullptr)
@@ -313,8 +286,8 @@ void MultiTypeReader::ReadRaster(krv::gobs::Raster* poRaster)
                                  "this Reader.");
     if (poRaster->GetDataType() != mpoState->moType)
         throw krv::DataException("The data type in the requested Rasterdoesn't match the data type of this Reader.");
-    if (mpoState->moGroups.size() == 1 && mpoState->First().GetDataType() == poRaster->GetDataType())
-        mpoState->First().ReadRaster(poRaster);
+    if (mpoState->moGroups.size() == 1 && GetSource().GetDataType() == poRaster->GetDataType())
+        GetSource().ReadRaster(poRaster);
     else
         ReadGroups(*poRaster);
 }
@@ -362,39 +335,17 @@ krv::raster::Merger& MultiTypeReader::GetMerger()
     return *mpoState->mpoMerger;
 }
 
-RasterIterator MultiTypeReader::FindRaster(unsigned int nX, unsigned int nY)
-{
-    return RasterIterator(this, mpoState->moTiles.GetTileIndex(nX, nY));
-}
-
-RasterIterator MultiTypeReader::Begin()
-{
-    return RasterIterator(this);
-}
-
-RasterIterator MultiTypeReader::End()
-{
-    return RasterIterator(this, GetTileCount());
-}
-
-unsigned int MultiTypeReader::GetTileCount() const
-{
-    return mpoState->moTiles.GetTileRange() + 1;
-}
-
 void MultiTypeReader::SetOptimalTileSize()
 {
-    IRasterReader& oFirst = mpoState->First();
-    oFirst.SetOptimalTileSize();
-    SetTileSize(oFirst.GetTileWidth(), oFirst.GetTileHeight());
+    GetSource().SetOptimalTileSize();
+    SetTileSize(GetSource().GetTileWidth(), GetSource().GetTileHeight());
 }
 
 void MultiTypeReader::SetTileSize(unsigned int nWidth, unsigned int nHeight)
 {
-    krv::gobs::TileIterator oTiles = mpoState->moTiles;
-    oTiles.SetChunkSize(nWidth, nHeight); // a size that the grid refuses changes no group
     const unsigned int nOldWidth = GetTileWidth();
     const unsigned int nOldHeight = GetTileHeight();
+    DerivedReader::SetTileSize(nWidth, nHeight); // a size that the grid refuses changes no group
     const auto oSet = [=](IRasterReader& oReader)
     {
         oReader.SetTileSize(nWidth, nHeight);
@@ -403,24 +354,27 @@ void MultiTypeReader::SetTileSize(unsigned int nWidth, unsigned int nHeight)
     {
         oReader.SetTileSize(nOldWidth, nOldHeight);
     };
-    InStep(mpoState->moGroups, oSet, oUndo);
-    mpoState->moTiles = oTiles;
+    const std::exception_ptr oFailure = InStep(mpoState->moGroups, oSet, oUndo);
+    if (oFailure == nullptr)
+        return;
+    DerivedReader::SetTileSize(nOldWidth, nOldHeight);
+    std::rethrow_exception(oFailure);
 }
 
 void MultiTypeReader::SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour)
 {
-    const unsigned int nOldX = GetXMargin();
-    const unsigned int nOldY = GetYMargin();
-    const eMarginBehaviour eOld = GetMarginBehaviour();
     const auto oSet = [=](IRasterReader& oReader)
     {
         oReader.SetMargins(nXMargin, nYMargin, eBehaviour);
     };
-    const auto oUndo = [=](IRasterReader& oReader)
+    const auto oUndo = [this](IRasterReader& oReader)
     {
-        oReader.SetMargins(nOldX, nOldY, eOld);
+        oReader.SetMargins(GetXMargin(), GetYMargin(), GetMarginBehaviour());
     };
-    InStep(mpoState->moGroups, oSet, oUndo);
+    const std::exception_ptr oFailure = InStep(mpoState->moGroups, oSet, oUndo);
+    KeepMargins(GetSource().GetXMargin(), GetSource().GetYMargin(), GetSource().GetMarginBehaviour());
+    if (oFailure != nullptr)
+        std::rethrow_exception(oFailure);
 }
 
 IOverviewReaderAccessor* MultiTypeReader::GetOverviewReaderAccessor()
@@ -447,59 +401,9 @@ AuxiliaryData MultiTypeReader::GetAuxiliaryData() const
     return oData;
 }
 
-unsigned int MultiTypeReader::GetTileWidth() const
-{
-    return mpoState->First().GetTileWidth();
-}
-
-unsigned int MultiTypeReader::GetTileHeight() const
-{
-    return mpoState->First().GetTileHeight();
-}
-
 const std::vector<IChannelInfo*>& MultiTypeReader::GetChannelsInfo() const
 {
     return mpoState->moInfos.Get();
-}
-
-IFileFormat* MultiTypeReader::GetFileFormat() const
-{
-    return mpoState->First().GetFileFormat();
-}
-
-unsigned int MultiTypeReader::GetXMargin() const
-{
-    return mpoState->First().GetXMargin();
-}
-
-unsigned int MultiTypeReader::GetYMargin() const
-{
-    return mpoState->First().GetYMargin();
-}
-
-eMarginBehaviour MultiTypeReader::GetMarginBehaviour() const
-{
-    return mpoState->First().GetMarginBehaviour();
-}
-
-krv::ogc::cs::ICRS* MultiTypeReader::GetCRS() const
-{
-    return mpoState->First().GetCRS();
-}
-
-krv::ogc::cs::GeocodingInfo* MultiTypeReader::GetGeocodingInfo() const
-{
-    return mpoState->First().GetGeocodingInfo();
-}
-
-unsigned int MultiTypeReader::GetWidth() const
-{
-    return mpoState->First().GetWidth();
-}
-
-unsigned int MultiTypeReader::GetHeight() const
-{
-    return mpoState->First().GetHeight();
 }
 
 unsigned int MultiTypeReader::GetChansCount() const
@@ -510,6 +414,16 @@ unsigned int MultiTypeReader::GetChansCount() const
 const krv::gobs::DataType& MultiTypeReader::GetDataType() const
 {
     return mpoState->moType;
+}
+
+IDataset* MultiTypeReader::GetDataset() const
+{
+    return mpoState->mpoDataset.get();
+}
+
+const std::vector<unsigned int>& MultiTypeReader::GetChannels() const
+{
+    return mpoState->moChannels;
 }
 
 } // namespace krv::datasources

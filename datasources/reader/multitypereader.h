@@ -1,6 +1,6 @@
 #pragma once
 
-#include "datasources/reader/irasterreader.h"
+#include "datasources/reader/derived/derivedreader.h"
 #include "gobs/raster/datatype.h"
 #include "toolkit/core/ownedorborrowed.h"
 #include "toolkit/exceptions/place.h"
@@ -36,7 +36,7 @@ enum eChannelPlacement
 // requested one. Channels of one type are read together; all groups are converted and placed in the result in one pass.
 // A constructor warns when the type does not hold the values of every channel exactly, and when a requested type orders
 // before the promoted one. Readers of the groups stay in step: a setting that some of them refuse changes none.
-class KRV_DATASOURCES_API MultiTypeReader : public IRasterReader
+class KRV_DATASOURCES_API MultiTypeReader : public DerivedReader
 {
 public:
     // Channels of a file, from 1. An empty list is a DataException here, intended: a mixed file has no natural list.
@@ -63,50 +63,38 @@ public:
     MultiTypeReader& operator=(const MultiTypeReader&) = delete;
     ~MultiTypeReader() override;
 
-    krv::gobs::Raster* GetRaster(unsigned int nIndex) override;
-    RasterIterator FindRaster(unsigned int nX, unsigned int nY) override;
-    RasterIterator Begin() override;
-    RasterIterator End() override;
-    unsigned int GetTileCount() const override;
+    using DerivedReader::ReadRaster;
+    void ReadRaster(krv::gobs::Raster* poRaster) override;
     // The block of the first group's format, for all groups.
     void SetOptimalTileSize() override;
     void SetTileSize(unsigned int nWidth, unsigned int nHeight) override;
-    unsigned int GetTileWidth() const override;
-    unsigned int GetTileHeight() const override;
-    const std::vector<IChannelInfo*>& GetChannelsInfo() const override;
-
-    IFileFormat* GetFileFormat() const override;
     void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour) override;
-    unsigned int GetXMargin() const override;
-    unsigned int GetYMargin() const override;
-    eMarginBehaviour GetMarginBehaviour() const override;
-    void ReadRaster(krv::gobs::Raster* poRaster) override;
-    krv::gobs::Raster* ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight) override;
+    const std::vector<IChannelInfo*>& GetChannelsInfo() const override;
     AuxiliaryData GetAuxiliaryData() const override;
-    krv::ogc::cs::ICRS* GetCRS() const override;
-    krv::ogc::cs::GeocodingInfo* GetGeocodingInfo() const override;
     IOverviewReaderAccessor* GetOverviewReaderAccessor() override;
-    unsigned int GetWidth() const override;
-    unsigned int GetHeight() const override;
     unsigned int GetChansCount() const override;
     const krv::gobs::DataType& GetDataType() const override;
 
+    IDataset* GetDataset() const override;
+    const std::vector<unsigned int>& GetChannels() const override;
+
 protected:
-    // For derived readers, which set up their own state.
+    // For derived readers, which set up their own state by what the public constructors call, and before anything else
+    // is: channels of a dataset, which goes with the reader when it is owned, or ready-made readers; then the type.
     MultiTypeReader();
 
+    void UseDataset(OwnedOrBorrowed<IDataset> oDataset, const std::vector<unsigned int>& oChannels,
+                    eChannelPlacement ePlacement, const krv::Place& oPlace = krv::Place::Current());
+    void UseReaders(IDataset* poDataset, const std::vector<IRasterReader*>& oReaders,
+                    const std::vector<unsigned int>& oChannels, const krv::Place& oPlace = krv::Place::Current());
+    void RequestType(const krv::gobs::DataType& oType, const krv::Place& oPlace = krv::Place::Current());
+
 private:
-    friend class MultiTypeOverviewReaderAccessor;
     struct State;
 
     void OpenFile(const std::string& fileName, const std::vector<unsigned int>& oChannels, eChannelPlacement ePlacement,
                   const krv::Place& oPlace);
-    void UseDataset(OwnedOrBorrowed<IDataset> oDataset, const std::vector<unsigned int>& oChannels,
-                    eChannelPlacement ePlacement, const krv::Place& oPlace);
-    void UseReaders(IDataset* poDataset, const std::vector<IRasterReader*>& oReaders,
-                    const std::vector<unsigned int>& oChannels, const krv::Place& oPlace);
     void Settle();
-    void RequestType(const krv::gobs::DataType& oType, const krv::Place& oPlace);
     void WarnOfLoss(const krv::gobs::DataType& oType, const krv::Place& oPlace) const;
     void ReadGroups(krv::gobs::Raster& oRaster);
     krv::raster::Merger& GetMerger();

@@ -2,10 +2,9 @@
 
 #include "datasources/interfaces/channelinfo.h"
 #include "datasources/interfaces/idataset.h"
-#include "datasources/interfaces/irasterio.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/detail/rasterchannels.h"
-#include "datasources/reader/rasteriterator.h"
+#include "toolkit/exceptions/exceptions.h"
 
 namespace krv::datasources
 {
@@ -25,37 +24,31 @@ void RasterAccess::SetRasterIO(std::unique_ptr<IRasterIO> oRasterIO, const krv::
     detail::OpenedChannels oOpened = detail::OpenRasterIO(std::move(oRasterIO), oType, Place::Current());
     for (std::size_t nChannel = 0; nChannel < GetChannels().size(); ++nChannel)
         oOpened.moInfos.Add(std::make_unique<ChannelInfo>(oType));
+    Commit(std::move(oOpened));
+}
+
+void RasterAccess::Commit(detail::OpenedChannels oOpened)
+{
+    SetGrid(oOpened.mnWidth, oOpened.mnHeight, oOpened.mnTileWidth, oOpened.mnTileHeight);
     mpoChannels->Commit(std::move(oOpened));
-}
-
-RasterIterator RasterAccess::FindRaster(unsigned int nX, unsigned int nY)
-{
-    return RasterIterator(this, mpoChannels->GetOpened().moGrid.GetTiles().GetTileIndex(nX, nY));
-}
-
-RasterIterator RasterAccess::Begin()
-{
-    return RasterIterator(this);
-}
-
-RasterIterator RasterAccess::End()
-{
-    return RasterIterator(this, GetTileCount());
-}
-
-unsigned int RasterAccess::GetTileCount() const
-{
-    return mpoChannels->GetOpened().moGrid.GetCount();
 }
 
 void RasterAccess::SetOptimalTileSize()
 {
-    mpoChannels->SetOptimalTileSize();
+    const detail::OpenedChannels& oOpened = mpoChannels->GetOpened();
+    if (oOpened.mpoRasterIO != nullptr)
+        TiledReader::SetTileSize(oOpened.mpoRasterIO->GetTileWidth(), oOpened.mpoRasterIO->GetTileHeight());
 }
 
-void RasterAccess::SetTileSize(unsigned int nWidth, unsigned int nHeight)
+void RasterAccess::SetLimitedMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour,
+                                     const Place& oPlace)
 {
-    mpoChannels->SetTileSize(nWidth, nHeight);
+    // Stored before the check, intended: the behaviour is a setting of its own.
+    KeepMargins(GetXMargin(), GetYMargin(), eBehaviour);
+    const bool bFits = nXMargin <= GetWidth() / 2 && nYMargin <= GetHeight() / 2;
+    if (!bFits && eBehaviour != eReplicate)
+        throw krv::DataException("Margins can't be wider than half of the file", oPlace);
+    KeepMargins(nXMargin, nYMargin, eBehaviour);
 }
 
 IFileFormat* RasterAccess::GetFileFormat() const
@@ -78,34 +71,9 @@ AuxiliaryData RasterAccess::GetAuxiliaryData() const
     return mpoChannels->GetAuxiliaryData();
 }
 
-unsigned int RasterAccess::GetTileWidth() const
-{
-    return mpoChannels->GetOpened().moGrid.GetTileWidth();
-}
-
-unsigned int RasterAccess::GetTileHeight() const
-{
-    return mpoChannels->GetOpened().moGrid.GetTileHeight();
-}
-
 const std::vector<IChannelInfo*>& RasterAccess::GetChannelsInfo() const
 {
     return mpoChannels->GetOpened().moInfos.Get();
-}
-
-unsigned int RasterAccess::GetXMargin() const
-{
-    return mpoChannels->GetXMargin();
-}
-
-unsigned int RasterAccess::GetYMargin() const
-{
-    return mpoChannels->GetYMargin();
-}
-
-eMarginBehaviour RasterAccess::GetMarginBehaviour() const
-{
-    return mpoChannels->GetMarginBehaviour();
 }
 
 unsigned int RasterAccess::GetWidth() const

@@ -1,7 +1,7 @@
 #pragma once
 
 #include "datasources/reader/idatasetaccess.h"
-#include "datasources/reader/irasterreader.h"
+#include "datasources/reader/tiledreader.h"
 
 #include <memory>
 
@@ -11,33 +11,25 @@ namespace krv::datasources
 namespace detail
 {
 class RasterChannels;
-}
+struct OpenedChannels;
+} // namespace detail
 
 class IRasterIO;
 
 // The answers that the standard readers and writers give alike: tile grid, margins, size, type and what the dataset
 // says of itself.
-class KRV_DATASOURCES_API RasterAccess : public IDatasetAccess, public virtual IRasterReader
+class KRV_DATASOURCES_API RasterAccess : public IDatasetAccess, public TiledReader
 {
 public:
     RasterAccess(const RasterAccess&) = delete;
     RasterAccess& operator=(const RasterAccess&) = delete;
     ~RasterAccess() override;
 
-    RasterIterator FindRaster(unsigned int nX, unsigned int nY) override;
-    RasterIterator Begin() override;
-    RasterIterator End() override;
-    unsigned int GetTileCount() const override;
+    // Does nothing before the channels are open.
     void SetOptimalTileSize() override;
-    void SetTileSize(unsigned int nWidth, unsigned int nHeight) override;
-    unsigned int GetTileWidth() const override;
-    unsigned int GetTileHeight() const override;
     const std::vector<IChannelInfo*>& GetChannelsInfo() const override;
 
     IFileFormat* GetFileFormat() const override;
-    unsigned int GetXMargin() const override;
-    unsigned int GetYMargin() const override;
-    eMarginBehaviour GetMarginBehaviour() const override;
     AuxiliaryData GetAuxiliaryData() const override;
     krv::ogc::cs::ICRS* GetCRS() const override;
     krv::ogc::cs::GeocodingInfo* GetGeocodingInfo() const override;
@@ -60,6 +52,11 @@ protected:
     // How the pixels of these channels get into the rasters, all in one type: the size of the image and its tiles are
     // those of the I/O, and each channel is described by its type. Throws DataException for null; the former I/O stays.
     void SetRasterIO(std::unique_ptr<IRasterIO> oRasterIO, const krv::gobs::DataType& oType);
+
+    // Takes over what was opened, with a tile grid over it.
+    void Commit(detail::OpenedChannels oOpened);
+    void SetLimitedMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour,
+                           const krv::Place& oPlace);
 
     std::unique_ptr<detail::RasterChannels> mpoChannels;
 };

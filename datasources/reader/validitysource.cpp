@@ -6,13 +6,12 @@
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/metadata/typednodata.h"
 #include "datasources/reader/basicreader.h"
+#include "datasources/reader/detail/rasterchannels.h"
 #include "gobs/mask/exactmaskdecision.h"
 #include "gobs/mask/mask.h"
 #include "gobs/raster/raster.h"
-#include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
-#include <numeric>
 
 namespace krv::datasources
 {
@@ -26,23 +25,6 @@ using krv::gobs::IMaskBuilder;
 using krv::gobs::Mask;
 using krv::gobs::MaskDecisionBuilder;
 using krv::gobs::Raster;
-
-IRasterDataset& RequireRaster(IDataset* poDataset, const Place& oPlace)
-{
-    if (poDataset == nullptr)
-        throw krv::DataException("The dataset is NULL", oPlace);
-    auto* const poRasterDataset = dynamic_cast<IRasterDataset*>(poDataset);
-    if (poRasterDataset == nullptr)
-        throw krv::DataException("This dataset doesn't support Raster.", oPlace);
-    return *poRasterDataset;
-}
-
-std::vector<unsigned int> FirstChannels(unsigned int nCount)
-{
-    std::vector<unsigned int> oChannels(nCount);
-    std::iota(oChannels.begin(), oChannels.end(), 1u);
-    return oChannels;
-}
 
 std::unique_ptr<const IMaskBuilder> ZeroOrNaN(unsigned int nChannel)
 {
@@ -126,12 +108,16 @@ unsigned int FindAlpha(const AuxiliaryData& oMetadata)
 ValiditySource::ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels, BkgdRule eRule,
                                bool bNoData)
 {
-    IRasterDataset& oRasterDataset = RequireRaster(poDataset, Place::Current());
+    const Place oPlace = Place::Current();
+    if (poDataset == nullptr)
+        throw krv::DataException("The dataset is NULL", oPlace);
+    const auto& oRasterDataset =
+        detail::RequireFacet<IRasterDataset>(poDataset, "This dataset doesn't support Raster.", oPlace);
     mnImageWidth = oRasterDataset.GetWidth();
     mnImageHeight = oRasterDataset.GetHeight();
     const AuxiliaryData oMetadata = poDataset->ReadAuxiliaryData();
     const std::vector<unsigned int> oListed =
-        oChannels.empty() ? FirstChannels(oMetadata.GetChannelCount()) : oChannels;
+        oChannels.empty() ? detail::FirstChannels(oMetadata.GetChannelCount()) : oChannels;
     const unsigned int nAlpha = FindAlpha(oMetadata);
     FindNoData(oMetadata, bNoData ? oListed : std::vector<unsigned int>(), nAlpha, eRule);
     FindBitmap(*poDataset);
@@ -147,7 +133,7 @@ ValiditySource::ValiditySource(const IRasterReader& oReader, BkgdRule eRule)
 {
     const AuxiliaryData oMetadata = oReader.GetAuxiliaryData();
     const unsigned int nAlpha = FindAlpha(oMetadata);
-    FindNoData(oMetadata, FirstChannels(oMetadata.GetChannelCount()), nAlpha, eRule);
+    FindNoData(oMetadata, detail::FirstChannels(oMetadata.GetChannelCount()), nAlpha, eRule);
     if (nAlpha != 0)
         UseAlphaOfRaster(nAlpha);
     SetMarginBehaviour(oReader.GetMarginBehaviour());

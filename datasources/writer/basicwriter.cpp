@@ -19,7 +19,6 @@
 #include "toolkit/core/core.h"
 #include "toolkit/exceptions/exceptions.h"
 
-#include <numeric>
 #include <utility>
 
 namespace krv::datasources
@@ -28,19 +27,12 @@ namespace krv::datasources
 namespace
 {
 
+using detail::RequireFacet;
+
 std::string FormatName(const IDataset& oDataset)
 {
     const IFileFormat* const poFormat = oDataset.GetFileFormat();
     return poFormat != nullptr ? poFormat->GetShortName() : std::string();
-}
-
-template <typename Facet>
-Facet& RequireFacet(IDataset* poDataset, const std::string& message, const Place& oPlace)
-{
-    auto* const poFacet = dynamic_cast<Facet*>(poDataset);
-    if (poFacet == nullptr)
-        throw krv::DataException(message, oPlace);
-    return *poFacet;
 }
 
 void Require(bool bCondition, const char* pMessage, const Place& oPlace)
@@ -122,7 +114,7 @@ BasicWriter::BasicWriter(IRasterDataset* poDataset, IRasterIO* poRasterIO, const
 
     const std::unique_ptr<IChannelInfo> oFirst(poDataset->GetChannelInfo(oChannels.front()));
     Require(oFirst != nullptr, "The dataset gave no description of the first channel", oPlace);
-    mpoChannels->Commit(detail::OpenRasterIO(std::move(oRasterIO), oFirst->GetDataType(), oPlace));
+    Commit(detail::OpenRasterIO(std::move(oRasterIO), oFirst->GetDataType(), oPlace));
     SetDataset(poRoot, oChannels, false);
 }
 
@@ -169,8 +161,8 @@ IRasterDataset* BasicWriter::RDSIf(const std::string& fileName)
 
 void BasicWriter::Init()
 {
-    mpoChannels->Commit(detail::OpenedChannels());
-    mpoChannels->SetMargins(0, 0, eMirror, Place::Current());
+    Commit(detail::OpenedChannels());
+    KeepMargins(0, 0, eMirror);
 }
 
 void BasicWriter::OpenDataset(bool bBitmaps)
@@ -197,8 +189,8 @@ void BasicWriter::OpenDataset(bool bBitmaps)
         Require(!oChannels.empty(), "No channels selected to write", oPlace);
         oOpened = detail::OpenChannels(oRasterDataset, oChannels, nullptr, oPlace);
     }
+    Commit(std::move(oOpened));
     mpoChannels->SetChannels(std::move(oChannels));
-    mpoChannels->Commit(std::move(oOpened));
     SetOptimalTileSize(); // virtual: a derived writer may choose its own
 }
 
@@ -217,7 +209,7 @@ void BasicWriter::OpenDatasetOrCleanup(bool bBitmaps)
 
 void BasicWriter::CleanupDataset()
 {
-    mpoChannels->Commit(detail::OpenedChannels());
+    Commit(detail::OpenedChannels());
     mpoChannels->DropOwnedDataset();
 }
 
@@ -244,18 +236,13 @@ void BasicWriter::OpenForWriting()
 krv::gobs::Raster* BasicWriter::GetRaster(unsigned int nIndex)
 {
     LazyOpen();
-    std::unique_ptr<krv::gobs::Raster> oRaster =
-        detail::MakeRaster(*this, mpoChannels->GetOpened().moGrid.GetTiles().GetTile(nIndex), Place::Current());
-    ReadRaster(oRaster.get());
-    return oRaster.release();
+    return RasterAccess::GetRaster(nIndex);
 }
 
 krv::gobs::Raster* BasicWriter::ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight)
 {
     LazyOpen();
-    std::unique_ptr<krv::gobs::Raster> oRaster = detail::MakeRaster(*this, {nX, nY, nWidth, nHeight}, Place::Current());
-    ReadRaster(oRaster.get());
-    return oRaster.release();
+    return RasterAccess::ReadRaster(nX, nY, nWidth, nHeight);
 }
 
 void BasicWriter::ReadRaster(krv::gobs::Raster* poRaster)
@@ -263,17 +250,17 @@ void BasicWriter::ReadRaster(krv::gobs::Raster* poRaster)
     const Place oPlace = Place::Current();
     LazyOpen();
     krv::gobs::CheckRasterCompatible(poRaster, this, oPlace);
-    mpoChannels->Read(*poRaster, oPlace);
+    mpoChannels->Read(*poRaster, GetMarginBehaviour(), oPlace);
 }
 
 void BasicWriter::FillMargins(krv::gobs::Raster* poRaster)
 {
-    mpoChannels->FillMargins(*poRaster, Place::Current());
+    mpoChannels->FillMargins(*poRaster, GetMarginBehaviour(), Place::Current());
 }
 
 void BasicWriter::SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour)
 {
-    mpoChannels->SetMargins(nXMargin, nYMargin, eBehaviour, Place::Current());
+    SetLimitedMargins(nXMargin, nYMargin, eBehaviour, Place::Current());
 }
 
 // No look at the I/O here, intended: a writer of a level or of bitmaps still reaches the levels of its dataset.
@@ -304,15 +291,11 @@ void BasicWriter::CreateNewFile(const krv::gobs::RasterInfo& oInfo)
     auto& oRasterDataset = RequireFacet<IRasterDataset>(
         poDataset, "Format does not support rasters: format=" + FormatName(*poDataset), oPlace);
     Require(!poDataset->Exists(), "The dataset already exists", oPlace);
-    std::vector<unsigned int> oChannels = GetChannels();
+    const std::vector<unsigned int>& oChannels = GetChannels();
     Require(oChannels.empty() || oChannels.size() == oInfo.GetChansCount(),
             "The RasterInfo does not match the write channels of this writer", oPlace);
     if (oChannels.empty())
-    {
-        oChannels.resize(oInfo.GetChansCount());
-        std::iota(oChannels.begin(), oChannels.end(), 1u);
-        mpoChannels->SetChannels(std::move(oChannels));
-    }
+        mpoChannels->SetChannels(detail::FirstChannels(oInfo.GetChansCount()));
     oRasterDataset.Create(oInfo);
     OpenDataset(false);
 }

@@ -18,12 +18,10 @@ namespace
 // One axis of the buffer: `mnValid` good pixels from `mnFirst` on a line of `mnLength`.
 struct Axis
 {
-    Axis(std::uint64_t nLength, std::uint64_t nMargin, bool bLow, bool bHigh)
-        : mnLength(nLength), mnFirst(bLow ? nMargin : 0)
+    Axis(std::uint64_t nLength, std::uint64_t nLow, std::uint64_t nHigh)
+        : mnLength(nLength), mnFirst(nLow), mnValid(nLow + nHigh < nLength ? nLength - nLow - nHigh : 0),
+          mnEnd(mnFirst + mnValid)
     {
-        const std::uint64_t nFilled = mnFirst + (bHigh ? nMargin : 0);
-        mnValid = nFilled < nLength ? nLength - nFilled : 0;
-        mnEnd = mnFirst + mnValid;
     }
 
     bool IsComplete() const { return mnValid == mnLength; }
@@ -335,19 +333,31 @@ void FillRasterMargins(Raster* const poRaster, eMarginBehaviour eBehaviour, unsi
 {
     if (poRaster == nullptr)
         throw DataException("The raster is NULL");
-    CheckBehaviour(eBehaviour, Place::Current());
-    const Axis oX(poRaster->GetFullWidth(), poRaster->GetXMargin(), nSides & eLeftSide, nSides & eRightSide);
-    const Axis oY(poRaster->GetFullHeight(), poRaster->GetYMargin(), nSides & eTopSide, nSides & eBottomSide);
+    const auto Margin = [nSides](eMarginSide eSide, unsigned int nMargin)
+    {
+        return (nSides & eSide) != 0 ? nMargin : 0;
+    };
+    FillRasterSides(*poRaster, eBehaviour, Margin(eLeftSide, poRaster->GetXMargin()),
+                    Margin(eRightSide, poRaster->GetXMargin()), Margin(eTopSide, poRaster->GetYMargin()),
+                    Margin(eBottomSide, poRaster->GetYMargin()), Place::Current());
+}
+
+void FillRasterSides(Raster& oRaster, eMarginBehaviour eBehaviour, std::uint64_t nLeft, std::uint64_t nRight,
+                     std::uint64_t nTop, std::uint64_t nBottom, const Place& oPlace)
+{
+    CheckBehaviour(eBehaviour, oPlace);
+    const Axis oX(oRaster.GetFullWidth(), nLeft, nRight);
+    const Axis oY(oRaster.GetFullHeight(), nTop, nBottom);
     if (oX.IsComplete() && oY.IsComplete())
         return;
     if (oX.mnValid == 0 || oY.mnValid == 0)
         throw ParameterException("No pixel of the raster is left to fill its margins from",
-                                 ParameterException::eInvalidValue, "nSides");
-    const Grid oGrid{oX, oY, poRaster->GetDataType().GetValueBits() * poRaster->GetChansCount(), eBehaviour};
+                                 ParameterException::eInvalidValue, "nSides", oPlace);
+    const Grid oGrid{oX, oY, oRaster.GetDataType().GetValueBits() * oRaster.GetChansCount(), eBehaviour};
     if (oGrid.mnPixelBits % 8 == 0)
-        Fill(ByteFiller(poRaster->GetBuffer(), oGrid), oGrid);
+        Fill(ByteFiller(oRaster.GetBuffer(), oGrid), oGrid);
     else
-        Fill(BitFiller(poRaster->GetBuffer(), oGrid), oGrid);
+        Fill(BitFiller(oRaster.GetBuffer(), oGrid), oGrid);
 }
 
 } // namespace krv::gobs

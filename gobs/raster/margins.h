@@ -1,6 +1,9 @@
 #pragma once
 
 #include "gobs/api.h"
+#include "toolkit/exceptions/place.h"
+
+#include <cstdint>
 
 // How pixels outside the image are made. k is an index outside 0..n-1 of a line of n pixels. At global scope, intended:
 // the reader's interfaces name it so.
@@ -35,6 +38,11 @@ enum eMarginSide : unsigned int
 // rasters included. Throws ParameterException for eException, eNoData and unknown behaviours, and when no valid pixel
 // is left.
 KRV_GOBS_API void FillRasterMargins(Raster* const poRaster, eMarginBehaviour eBehaviour, unsigned int nSides);
+
+// The same for so many columns and rows on each side, whatever the margins of the raster are.
+KRV_GOBS_API void FillRasterSides(Raster& oRaster, eMarginBehaviour eBehaviour, std::uint64_t nLeft,
+                                  std::uint64_t nRight, std::uint64_t nTop, std::uint64_t nBottom,
+                                  const krv::Place& oPlace = krv::Place::Current());
 
 // The index that stands for `nIndex` on a line of `nLength` > 0 pixels under a behaviour that copies pixels
 // (eReplicate, eMirror, eMirror101, eWrap). Throws ParameterException for the others.

@@ -6,16 +6,13 @@
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ioverviewio.h"
 #include "datasources/interfaces/irasterdataset.h"
-#include "datasources/interfaces/irasterio.h"
 #include "datasources/metadata/auxiliarydata.h"
-#include "datasources/reader/irasterreader.h"
 #include "gobs/raster/raster.h"
-#include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 
 #include <cstring>
 #include <limits>
-#include <utility>
+#include <numeric>
 
 namespace krv::datasources::detail
 {
@@ -68,41 +65,11 @@ void MeasureImage(OpenedChannels& oOpened, const Place& oPlace)
     const IRasterIO& oRasterIO = *oOpened.mpoRasterIO;
     oOpened.mnWidth = oRasterIO.GetFileWidth();
     oOpened.mnHeight = oRasterIO.GetFileHeight();
-    oOpened.moGrid = TileGrid(oOpened.mnWidth, oOpened.mnHeight);
-    oOpened.moGrid.SetTileSize(oRasterIO.GetTileWidth(), oRasterIO.GetTileHeight());
+    oOpened.mnTileWidth = oRasterIO.GetTileWidth();
+    oOpened.mnTileHeight = oRasterIO.GetTileHeight();
 }
 
 } // namespace
-
-ChannelInfos& ChannelInfos::operator=(ChannelInfos&& oOther) noexcept
-{
-    moInfos.swap(oOther.moInfos);
-    return *this;
-}
-
-ChannelInfos::~ChannelInfos()
-{
-    for (IChannelInfo* poInfo : moInfos)
-        delete poInfo;
-}
-
-void ChannelInfos::Add(std::unique_ptr<IChannelInfo> oInfo)
-{
-    moInfos.push_back(nullptr);
-    moInfos.back() = oInfo.release();
-}
-
-void TileGrid::SetTileSize(unsigned int nWidth, unsigned int nHeight)
-{
-    moTiles.SetChunkSize(nWidth, nHeight);
-    mnTileWidth = nWidth;
-    mnTileHeight = nHeight;
-}
-
-OpenedChannels::OpenedChannels() = default;
-OpenedChannels::OpenedChannels(OpenedChannels&&) noexcept = default;
-OpenedChannels& OpenedChannels::operator=(OpenedChannels&&) noexcept = default;
-OpenedChannels::~OpenedChannels() = default;
 
 OpenedChannels OpenChannels(IRasterDataset& oDataset, const std::vector<unsigned int>& oChannels,
                             std::unique_ptr<IRasterIO> oRasterIO, const Place& oPlace)
@@ -148,13 +115,16 @@ OpenedChannels OpenRasterIO(std::unique_ptr<IRasterIO> oRasterIO, const krv::gob
     return oOpened;
 }
 
+std::vector<unsigned int> FirstChannels(unsigned int nCount)
+{
+    std::vector<unsigned int> oChannels(nCount);
+    std::iota(oChannels.begin(), oChannels.end(), 1u);
+    return oChannels;
+}
+
 std::vector<unsigned int> AllChannels(const IRasterDataset& oDataset)
 {
-    std::vector<unsigned int> oChannels;
-    const unsigned int nCount = oDataset.GetChanCount();
-    for (unsigned int nChannel = 1; nChannel <= nCount && nChannel != 0; ++nChannel)
-        oChannels.push_back(nChannel);
-    return oChannels;
+    return FirstChannels(oDataset.GetChanCount());
 }
 
 AuxiliaryData SelectChannelData(IDataset& oDataset, const std::vector<unsigned int>& oChannels)
@@ -179,15 +149,6 @@ int ToPosition(long long nValue, const Place& oPlace)
     return static_cast<int>(nValue);
 }
 
-std::unique_ptr<krv::gobs::Raster> MakeRaster(const IRasterReader& oReader, const krv::gobs::Tile& oWindow,
-                                              const Place& oPlace)
-{
-    return std::make_unique<krv::gobs::Raster>(
-        krv::gobs::RasterInfo(oWindow.GetWidth(), oWindow.GetHeight(), oReader.GetChansCount(), oReader.GetDataType()),
-        krv::gobs::RasterContext(ToPosition(oWindow.GetX(), oPlace), ToPosition(oWindow.GetY(), oPlace),
-                                 oReader.GetXMargin(), oReader.GetYMargin()));
-}
-
 RasterChannels::~RasterChannels()
 {
     moOpened.mpoRasterIO.reset();
@@ -210,25 +171,7 @@ bool RasterChannels::HasLevels() const
     return !mbBitmaps && dynamic_cast<const IOverviewIO*>(moOpened.mpoRasterIO.get()) == nullptr;
 }
 
-void RasterChannels::SetOptimalTileSize()
-{
-    if (IsOpen())
-        SetTileSize(moOpened.mpoRasterIO->GetTileWidth(), moOpened.mpoRasterIO->GetTileHeight());
-}
-
-void RasterChannels::SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour,
-                                const Place& oPlace)
-{
-    // Stored before the check, intended: the behaviour is a setting of its own.
-    meMarginBehaviour = eBehaviour;
-    const bool bFits = nXMargin <= moOpened.mnWidth / 2 && nYMargin <= moOpened.mnHeight / 2;
-    if (!bFits && eBehaviour != eReplicate)
-        throw krv::DataException("Margins can't be wider than half of the file", oPlace);
-    mnXMargin = nXMargin;
-    mnYMargin = nYMargin;
-}
-
-void RasterChannels::Read(krv::gobs::Raster& oRaster, const Place& oPlace)
+void RasterChannels::Read(krv::gobs::Raster& oRaster, eMarginBehaviour eBehaviour, const Place& oPlace)
 {
     IRasterIO& oRasterIO = *moOpened.mpoRasterIO;
     const unsigned int nXMargin = oRaster.GetXMargin();
@@ -259,15 +202,24 @@ void RasterChannels::Read(krv::gobs::Raster& oRaster, const Place& oPlace)
     const unsigned int nBottom = oExtent.MarginOf(krv::gobs::eBottomSide, nYMargin);
     oRasterIO.ReadWindow(oExtent.mnX, oExtent.mnY, nFullWidth, nFullHeight, nLeft, nTop, nFullWidth - nLeft - nRight,
                          nFullHeight - nTop - nBottom, oRaster.GetBuffer());
-    FillMargins(oRaster, oPlace);
+    FillMargins(oRaster, eBehaviour, oPlace);
 }
 
-void RasterChannels::FillMargins(krv::gobs::Raster& oRaster, const Place& oPlace) const
+void RasterChannels::FillMargins(krv::gobs::Raster& oRaster, eMarginBehaviour eBehaviour, const Place& oPlace) const
 {
-    if (meMarginBehaviour == eException)
+    if (eBehaviour == eException)
         throw krv::DataException("Margin behaviour is eException", oPlace);
     const Extent oExtent(oRaster, moOpened.mnWidth, moOpened.mnHeight, oPlace);
-    krv::gobs::FillRasterMargins(&oRaster, meMarginBehaviour, oExtent.mnOutside);
+    krv::gobs::FillRasterMargins(&oRaster, eBehaviour, oExtent.mnOutside);
+}
+
+void RasterChannels::ReadInside(krv::gobs::Raster& oRaster, const Place& oPlace)
+{
+    const Extent oExtent(oRaster, moOpened.mnWidth, moOpened.mnHeight, oPlace);
+    const auto nFullWidth = static_cast<unsigned int>(oExtent.mnWidth);
+    const auto nFullHeight = static_cast<unsigned int>(oExtent.mnHeight);
+    moOpened.mpoRasterIO->ReadWindow(oExtent.mnX, oExtent.mnY, nFullWidth, nFullHeight, 0, 0, nFullWidth, nFullHeight,
+                                     oRaster.GetBuffer());
 }
 
 void RasterChannels::Write(const krv::gobs::Raster& oRaster, const Place& oPlace)

@@ -1,19 +1,21 @@
 #pragma once
 
+#include "datasources/interfaces/ichannelinfo.h"
+#include "datasources/interfaces/irasterio.h"
 #include "gobs/raster/datatype.h"
 #include "gobs/raster/margins.h"
-#include "gobs/tile/tileiterator.h"
 #include "toolkit/core/ownedorborrowed.h"
-#include "toolkit/exceptions/place.h"
+#include "toolkit/exceptions/exceptions.h"
 
 #include <memory>
+#include <string>
+#include <utility>
 #include <vector>
 
 namespace krv::gobs
 {
 class Raster;
-class Tile;
-} // namespace krv::gobs
+}
 
 namespace krv::ogc::cs
 {
@@ -25,11 +27,8 @@ namespace krv::datasources
 
 class AuxiliaryData;
 class IBitmapDataset;
-class IChannelInfo;
 class IDataset;
 class IRasterDataset;
-class IRasterIO;
-class IRasterReader;
 
 namespace detail
 {
@@ -38,52 +37,28 @@ namespace detail
 class ChannelInfos
 {
 public:
-    ChannelInfos() = default;
-    ChannelInfos(ChannelInfos&& oOther) noexcept = default;
-    ChannelInfos& operator=(ChannelInfos&& oOther) noexcept;
-    ~ChannelInfos();
-
-    void Add(std::unique_ptr<IChannelInfo> oInfo);
+    void Add(std::unique_ptr<IChannelInfo> oInfo)
+    {
+        moOwned.push_back(std::move(oInfo));
+        moInfos.push_back(moOwned.back().get());
+    }
     const std::vector<IChannelInfo*>& Get() const { return moInfos; }
 
 private:
+    std::vector<std::unique_ptr<IChannelInfo>> moOwned;
     std::vector<IChannelInfo*> moInfos;
-};
-
-// The tiles of an image, and the size of a tile as it was asked for.
-class TileGrid
-{
-public:
-    TileGrid() = default;
-    TileGrid(unsigned int nWidth, unsigned int nHeight) : moTiles(nWidth, nHeight) {}
-
-    // Throws DataException, and changes nothing, for a size that gives too many tiles.
-    void SetTileSize(unsigned int nWidth, unsigned int nHeight);
-    unsigned int GetTileWidth() const { return mnTileWidth; }
-    unsigned int GetTileHeight() const { return mnTileHeight; }
-    unsigned int GetCount() const { return moTiles.GetTileRange() + 1; }
-    const krv::gobs::TileIterator& GetTiles() const { return moTiles; }
-
-private:
-    krv::gobs::TileIterator moTiles{0, 0};
-    unsigned int mnTileWidth = 0;
-    unsigned int mnTileHeight = 0;
 };
 
 // Everything that becomes known when channels are opened; made as a whole or not at all.
 struct OpenedChannels
 {
-    OpenedChannels();
-    OpenedChannels(OpenedChannels&&) noexcept;
-    OpenedChannels& operator=(OpenedChannels&&) noexcept;
-    ~OpenedChannels();
-
     std::unique_ptr<IRasterIO> mpoRasterIO;
     ChannelInfos moInfos;
     krv::gobs::DataType moType;
-    TileGrid moGrid;
     unsigned int mnWidth = 0;
     unsigned int mnHeight = 0;
+    unsigned int mnTileWidth = 0; // as the I/O prefers
+    unsigned int mnTileHeight = 0;
 };
 
 // Opens image channels in the type of the first; a given I/O is used instead of the dataset's own and taken over.
@@ -97,7 +72,18 @@ OpenedChannels OpenBitmaps(IBitmapDataset& oDataset, const std::vector<unsigned 
 OpenedChannels OpenRasterIO(std::unique_ptr<IRasterIO> oRasterIO, const krv::gobs::DataType& oType,
                             const Place& oPlace);
 
-// 1, 2, ... the dataset's channel count
+// The facet of a dataset. Throws DataException with the message for null and for one without the facet.
+template <typename Facet>
+Facet& RequireFacet(IDataset* poDataset, const std::string& message, const Place& oPlace)
+{
+    auto* const poFacet = dynamic_cast<Facet*>(poDataset);
+    if (poFacet == nullptr)
+        throw krv::DataException(message, oPlace);
+    return *poFacet;
+}
+
+// 1, 2, ... the count, and the dataset's channel count
+std::vector<unsigned int> FirstChannels(unsigned int nCount);
 std::vector<unsigned int> AllChannels(const IRasterDataset& oDataset);
 
 // The file metadata of a dataset, and metadata and descriptions of the listed channels in the order of the list.
@@ -106,11 +92,7 @@ AuxiliaryData SelectChannelData(IDataset& oDataset, const std::vector<unsigned i
 // The signed 32-bit number that a raster's position is; throws DataException when it is none.
 int ToPosition(long long nValue, const Place& oPlace);
 
-// An unfilled raster of a reader's type and channels with its current margins.
-std::unique_ptr<krv::gobs::Raster> MakeRaster(const IRasterReader& oReader, const krv::gobs::Tile& oWindow,
-                                              const Place& oPlace);
-
-// What readers and writers have in common: the dataset, the opened channels, the tile grid and the margins.
+// What readers and writers have in common: the dataset and the opened channels.
 class RasterChannels
 {
 public:
@@ -137,18 +119,12 @@ public:
     bool HasLevels() const;
     const OpenedChannels& GetOpened() const { return moOpened; }
 
-    void SetTileSize(unsigned int nWidth, unsigned int nHeight) { moOpened.moGrid.SetTileSize(nWidth, nHeight); }
-    // Does nothing before the channels are open.
-    void SetOptimalTileSize();
-    void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour, const Place& oPlace);
-    unsigned int GetXMargin() const { return mnXMargin; }
-    unsigned int GetYMargin() const { return mnYMargin; }
-    eMarginBehaviour GetMarginBehaviour() const { return meMarginBehaviour; }
-
     // Fills a raster of the right count and type, margins by its own description. Margins that lie wholly inside the
     // image are read with it, the others are made afterwards by FillMargins.
-    void Read(krv::gobs::Raster& oRaster, const Place& oPlace);
-    void FillMargins(krv::gobs::Raster& oRaster, const Place& oPlace) const;
+    void Read(krv::gobs::Raster& oRaster, eMarginBehaviour eBehaviour, const Place& oPlace);
+    void FillMargins(krv::gobs::Raster& oRaster, eMarginBehaviour eBehaviour, const Place& oPlace) const;
+    // What of a raster and its margins lies in the image; every other pixel stays as it is.
+    void ReadInside(krv::gobs::Raster& oRaster, const Place& oPlace);
 
     // Stores the centre of a raster of the right count and type.
     void Write(const krv::gobs::Raster& oRaster, const Place& oPlace);
@@ -162,9 +138,6 @@ private:
     bool mbBitmaps = false;
     std::vector<unsigned int> moChannels;
     OpenedChannels moOpened;
-    eMarginBehaviour meMarginBehaviour = eMirror;
-    unsigned int mnXMargin = 0;
-    unsigned int mnYMargin = 0;
 };
 
 } // namespace detail

@@ -1,0 +1,59 @@
+#pragma once
+
+#include "datasources/reader/derived/derivedoverviewreaderaccessor.h"
+#include "datasources/reader/idatasetaccess.h"
+#include "datasources/reader/tiledreader.h"
+#include "toolkit/core/ownedorborrowed.h"
+
+#include <memory>
+
+namespace krv::datasources
+{
+
+// The base of readers over another reader, their source. It has tiles and margins of its own; everything else is the
+// source's answer until a derived class overrides it: type, channels and record where they differ. A derived class says
+// in any case how a raster is filled, by ReadRaster, and how a reader of a level is wrapped. One thread at a time.
+class KRV_DATASOURCES_API DerivedReader : public TiledReader, public IDatasetAccess
+{
+public:
+    ~DerivedReader() override;
+
+    // The tile of the source as it is then.
+    void SetOptimalTileSize() override;
+    // Passed on to the source, which makes the margins.
+    void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour) override;
+
+    const std::vector<IChannelInfo*>& GetChannelsInfo() const override { return GetSource().GetChannelsInfo(); }
+    IFileFormat* GetFileFormat() const override { return GetSource().GetFileFormat(); }
+    AuxiliaryData GetAuxiliaryData() const override;
+    krv::ogc::cs::ICRS* GetCRS() const override { return GetSource().GetCRS(); }
+    krv::ogc::cs::GeocodingInfo* GetGeocodingInfo() const override { return GetSource().GetGeocodingInfo(); }
+    // The levels of the source, each reader wrapped; null without a wrapping.
+    IOverviewReaderAccessor* GetOverviewReaderAccessor() override;
+    unsigned int GetWidth() const override { return GetSource().GetWidth(); }
+    unsigned int GetHeight() const override { return GetSource().GetHeight(); }
+    unsigned int GetChansCount() const override { return GetSource().GetChansCount(); }
+    const krv::gobs::DataType& GetDataType() const override { return GetSource().GetDataType(); }
+
+    // What the source stands on, by which validity is asked; null and no channels over a reader that does not show it.
+    IDataset* GetDataset() const override;
+    const std::vector<unsigned int>& GetChannels() const override;
+
+protected:
+    // No source, no tiles, no margins, eMirror. A derived class sets its source before anything else is called.
+    DerivedReader();
+    // Shares source, grid and margins, whose last owner releases what is owned.
+    DerivedReader(const DerivedReader& oOther);
+
+    // Takes the source's size and its tile.
+    void SetSource(OwnedOrBorrowed<IRasterReader> oSource);
+    IRasterReader& GetSource() const { return **mpoSource; }
+
+    // How the reader of a level becomes one of this kind; holds nothing of this reader. None unless overridden.
+    virtual LevelWrapper GetLevelWrapper() const;
+
+private:
+    std::shared_ptr<OwnedOrBorrowed<IRasterReader>> mpoSource; // null only inside
+};
+
+} // namespace krv::datasources
