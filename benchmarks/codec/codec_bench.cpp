@@ -5,11 +5,11 @@
 #include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "plugins/support/codec/bits.h"
-#include "plugins/support/codec/deflatedecoder.h"
+#include "plugins/support/codec/deflate.h"
 #include "plugins/support/codec/interleave.h"
-#include "plugins/support/codec/lzwdecoder.h"
+#include "plugins/support/codec/lzw.h"
 #include "plugins/support/codec/predictor.h"
-#include "plugins/support/codec/zstddecoder.h"
+#include "plugins/support/codec/zstd.h"
 
 #include <array>
 #include <cmath>

@@ -1,9 +1,9 @@
 #pragma once
 
 #include "benchmarks/support/scene.h"
-#include "plugins/support/codec/deflatedecoder.h"
-#include "plugins/support/codec/lzwdecoder.h"
-#include "plugins/support/codec/zstddecoder.h"
+#include "plugins/support/codec/deflate.h"
+#include "plugins/support/codec/lzw.h"
+#include "plugins/support/codec/zstd.h"
 
 #include <cstdint>
 #include <list>

@@ -12,9 +12,9 @@
 #include "datasources/reader/basicreader.h"
 #include "datasources/writer/basicwriter.h"
 #include "gobs/raster/raster.h"
-#include "plugins/support/codec/deflateencoder.h"
+#include "plugins/support/codec/deflate.h"
 #include "plugins/support/codec/predictor.h"
-#include "plugins/support/codec/zstdencoder.h"
+#include "plugins/support/codec/zstd.h"
 
 #include <fcntl.h>
 #include <tiffio.h>

@@ -3,6 +3,9 @@
 #include "gobs/raster/datatype.h"
 #include "toolkit/exceptions/exceptions.h"
 
+#include <optional>
+#include <string>
+
 namespace krv::gobs
 {
 
@@ -52,6 +55,15 @@ public:
             throw ParameterException("Cannot evaluate TypeToString() for the provided datatype",
                                      ParameterException::eInvalidValue, "eDataType");
         return TEXTS[eDataType];
+    }
+
+    // The counterpart; no value for any other text.
+    static std::optional<NativeDataTypeCode> StringToType(const std::string& text)
+    {
+        for (int nCode = eDT_8U; nCode <= eDT_C64R; ++nCode)
+            if (TypeToString(static_cast<NativeDataTypeCode>(nCode)) == text)
+                return static_cast<NativeDataTypeCode>(nCode);
+        return std::nullopt;
     }
 };
 

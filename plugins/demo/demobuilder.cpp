@@ -1,7 +1,6 @@
 #include "datasources/interfaces/formatplugin.h"
 #include "plugins/demo/demodataset.h"
 #include "plugins/support/builder.h"
-#include "toolkit/exceptions/exceptions.h"
 
 namespace krv::plugins::demo
 {
@@ -14,14 +13,14 @@ public:
     krv::datasources::IDataset* Open(const std::string& fileName, AccessMode eMode) override
     {
         CheckReadOnly(fileName, eMode);
-        return new DemoDataset(fileName, GetFileFormat(), DemoDataset::Mode::eOpen);
+        return new DemoDataset(fileName, GetFileFormat());
     }
 
     krv::datasources::IDataset* Create(const std::string& fileName, const std::string& options) override
     {
-        if (options.find_first_not_of(' ') != std::string::npos)
-            throw krv::DataException(fileName + ": the format DEMO has no options, not " + options);
-        return new DemoDataset(fileName, GetFileFormat(), DemoDataset::Mode::eCreate);
+        RefuseOptions(fileName, options);
+        return new DemoDataset(GetFileFormat(),
+                               std::make_shared<support::HeadedFile>(fileName, DemoDataset::FIRST_LINES));
     }
 
     // By the first bytes alone: cheap, no file access, no side effects. A file that was not written to its end is known
@@ -29,7 +28,10 @@ public:
     int Identify(const std::string&, const unsigned char* pHeader, unsigned int nHeaderLength, int) override
     {
         const std::string_view header(reinterpret_cast<const char*>(pHeader), nHeaderLength);
-        return header.starts_with(DemoHeader::SIGNATURE) || header.starts_with(DemoHeader::UNFINISHED) ? 0 : 1;
+        return header.starts_with(DemoDataset::FIRST_LINES.moFinished) ||
+                       header.starts_with(DemoDataset::FIRST_LINES.moUnfinished)
+                   ? 0
+                   : 1;
     }
 };
 

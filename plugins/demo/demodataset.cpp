@@ -1,105 +1,109 @@
 #include "plugins/demo/demodataset.h"
 
-#include "plugins/demo/demoblocksource.h"
+#include "gobs/raster/datatypeadapter.h"
+#include "plugins/support/image/plainsource.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
-#include <limits>
+#include <bit>
+#include <climits>
+#include <sstream>
 
 namespace krv::plugins::demo
 {
 
-DemoDataset::DemoDataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat, Mode eMode)
-    : Dataset(fileName, poFormat), meMode(eMode)
+static_assert(std::endian::native == std::endian::little, "values would have to be swapped");
+
+const support::HeadedFile::FirstLines DemoDataset::FIRST_LINES = {"DEMO1\n", "DEMO-\n"};
+
+DemoDataset::DemoDataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat)
+    : RecordDataset(fileName, poFormat),
+      mpoFile(std::make_shared<support::HeadedFile>(
+          std::make_shared<support::File>(fileName, support::File::Mode::eRead), FIRST_LINES))
 {
-    if (meMode == Mode::eOpen)
-        UseFile(std::make_shared<DemoFile>(fileName));
+    ReadHeader();
+    SetImage(MakeLevelSource(1, mpoFile->GetHeaderBytes()));
 }
 
-// I/O objects may keep the file a little longer.
-DemoDataset::~DemoDataset()
+DemoDataset::DemoDataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<support::HeadedFile> poNew)
+    : RecordDataset(poFormat, poNew), mpoFile(std::move(poNew))
 {
-    if (mpoFile != nullptr && mpoFile->IsChanged())
-        WarnOfLoss();
-    if (mpoFile != nullptr)
-        mpoFile->Discard();
-}
-
-void DemoDataset::UseFile(std::shared_ptr<DemoFile> poFile)
-{
-    SetImage(std::make_unique<DemoBlockSource>(poFile));
-    mpoFile = std::move(poFile);
 }
 
 void DemoDataset::Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes)
 {
-    CheckOpen();
-    if (meMode == Mode::eOpen || HasImage())
-        Refuse("an image exists already");
-    if (std::min(nWidth, nHeight) < 1 || std::max(nWidth, nHeight) > std::numeric_limits<int>::max() || oTypes.empty())
-        Refuse("an image of " + std::to_string(nWidth) + " x " + std::to_string(nHeight) + " pixels and " +
-               std::to_string(oTypes.size()) + " channels cannot be laid out");
-    for (const krv::gobs::DataType& oType : oTypes)
-        if (oType.GetNativeCode() == krv::gobs::eDT_BIT)
-            Refuse("channels of single bits cannot be stored");
-    UseFile(std::make_shared<DemoFile>(
-        GetFileName(),
-        DemoHeader{nWidth, nHeight, oTypes, krv::datasources::AuxiliaryData(static_cast<unsigned int>(oTypes.size()))},
-        Replaces()));
+    CheckCreate(nWidth, nHeight, oTypes, Place::Current());
+    mnWidth = nWidth;
+    mnHeight = nHeight;
+    moTypes = oTypes;
+    support::RecordText oRecord;
+    oRecord.moTags = krv::datasources::AuxiliaryData(static_cast<unsigned int>(oTypes.size()));
+    mpoFile->Make(MakeHeader(oRecord), support::PlainSource::CountBytes(MakeLayout(1)));
+    ShowRecord(std::move(oRecord));
+    SetImage(MakeLevelSource(1, mpoFile->GetHeaderBytes()));
 }
 
-bool DemoDataset::Exists() const
+void DemoDataset::ReadHeader()
 {
-    return meMode == Mode::eCreate ? mpoFile != nullptr : Dataset::Exists();
-}
-
-krv::datasources::FileAccessState DemoDataset::Delete()
-{
-    const bool bNamed = meMode == Mode::eOpen || (mpoFile != nullptr && mpoFile->IsNamed());
-    if (mpoFile != nullptr)
-        mpoFile->Discard();
-    if (bNamed)
-        return Dataset::Delete();
-    Close();
-    return krv::datasources::eDone;
-}
-
-krv::datasources::AuxiliaryData DemoDataset::ReadAuxiliaryData()
-{
-    static_cast<void>(GetImage());
-    return mpoFile->GetHeader().moTags;
-}
-
-void DemoDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData)
-{
-    if (!IsWritable())
-        return Dataset::WriteAuxiliaryData(oData);
-    if (oData.GetChannelCount() != GetChanCount())
-        Refuse("the metadata are those of " + std::to_string(oData.GetChannelCount()) + " channels, not of " +
-               std::to_string(GetChanCount()));
-    mpoFile->SetTags(oData);
-}
-
-void DemoDataset::Synchronize()
-{
-    CheckOpen();
-    if (IsWritable())
-        mpoFile->Finish();
-}
-
-void DemoDataset::Close()
-{
-    if (IsWritable())
+    std::istringstream oLines = mpoFile->ReadHeader();
+    long long nWidth = 0, nHeight = 0; // every number from a file is hostile: read wide and signed, then checked
+    std::string line;
+    std::getline(oLines >> nWidth >> nHeight >> std::ws, line);
+    if (std::min(nWidth, nHeight) < 1 || std::max(nWidth, nHeight) > INT_MAX || line.empty())
+        throw krv::FileFormatException(GetFileName(), GetFileName() + " has no valid image size or no channels");
+    mnWidth = static_cast<unsigned int>(nWidth);
+    mnHeight = static_cast<unsigned int>(nHeight);
+    std::istringstream oWords(line);
+    for (std::string type; oWords >> type;)
     {
-        mpoFile->Finish();
-        mpoFile->Discard();
+        const auto oType = krv::gobs::DataTypeAdapter::StringToType(type);
+        if (!oType)
+            throw krv::FileFormatException(GetFileName(), GetFileName() + " has channels of the unknown type " + type);
+        moTypes.emplace_back(*oType);
     }
-    Dataset::Close();
+    support::RecordText oRecord;
+    oRecord.moTags = krv::datasources::AuxiliaryData(static_cast<unsigned int>(moTypes.size()));
+    oRecord.Read(oLines);
+    ShowRecord(std::move(oRecord));
 }
 
-krv::datasources::AccessCapabilities DemoDataset::GetRasterCapabilities()
+std::string DemoDataset::MakeHeader(const support::RecordText& oRecord) const
 {
-    return {true, meMode == Mode::eCreate, meMode == Mode::eCreate};
+    std::string text = std::to_string(mnWidth) + " " + std::to_string(mnHeight) + "\n";
+    for (const krv::gobs::DataType& oType : moTypes)
+        text += oType.Describe() + " ";
+    return text + "\n" + oRecord.Write();
+}
+
+support::ImageLayout DemoDataset::MakeLayout(unsigned int nLevel) const
+{
+    constexpr unsigned int BLOCK_SIZE = 256; // readers take it for their tiles
+    std::vector<support::Plane> oPlanes;
+    for (const krv::gobs::DataType& oType : moTypes)
+        oPlanes.push_back({oType, 1, {}});
+    return {(mnWidth - 1) / nLevel + 1, (mnHeight - 1) / nLevel + 1, BLOCK_SIZE, BLOCK_SIZE, std::move(oPlanes)};
+}
+
+void DemoDataset::StoreRecord(const support::RecordText& oRecord) const
+{
+    mpoFile->SetHeader(MakeHeader(oRecord));
+}
+
+std::uint64_t DemoDataset::MakeRoom(unsigned int nLevel)
+{
+    return mpoFile->Append(support::PlainSource::CountBytes(MakeLayout(nLevel)));
+}
+
+std::unique_ptr<support::IBlockSource> DemoDataset::MakeLevelSource(unsigned int nLevel, std::uint64_t nPlace)
+{
+    const auto BeforeWrite = [this, nLevel]
+    {
+        mpoFile->BeginChange();
+        if (nLevel == 1)
+            ForgetLevels();
+    };
+    return std::make_unique<support::PlainSource>(mpoFile->GetFile(), nPlace, MakeLayout(nLevel),
+                                                  IsWritten() ? BeforeWrite : std::function<void()>());
 }
 
 } // namespace krv::plugins::demo

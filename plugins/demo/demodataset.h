@@ -1,43 +1,46 @@
 #pragma once
 
-#include "datasources/metadata/auxiliarydata.h"
-#include "plugins/demo/demofile.h"
-#include "plugins/support/dataset.h"
+#include "plugins/support/image/imagelayout.h"
+#include "plugins/support/recorddataset.h"
+#include "plugins/support/writing/headedfile.h"
 
 namespace krv::plugins::demo
 {
 
-// A header (DemoHeader) and pixels: channel after channel, rows top to bottom, values little-endian without padding.
-// A new file is there after Synchronize or Close; a dataset that is destroyed before leaves nothing behind.
-class DemoDataset : public support::Dataset
+// A header, then pixels: channel after channel, rows top to bottom, values little-endian without padding; behind them
+// those of levels. Files are read and created, not updated. The header is text:
+//     DEMO1
+//     640 480             width and height
+//     8U 8U 32R           a data type for each channel
+//     scene=alps          and the record (support::RecordText)
+class DemoDataset : public support::RecordDataset
 {
 public:
-    enum class Mode
-    {
-        eOpen,
-        eCreate // the image is laid out by Create
-    };
+    static const support::HeadedFile::FirstLines FIRST_LINES;
 
-    // Throws krv::FileFormatException when the header is not whole or the file is shorter than it says.
-    DemoDataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat, Mode eMode);
-    ~DemoDataset() override;
+    // A file to be read. Throws krv::FileFormatException when its header is not whole or it is shorter than that says.
+    DemoDataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat);
+    // A new one, which Create makes.
+    DemoDataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<support::HeadedFile> poNew);
 
     using support::Dataset::Create;
     void Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes) override;
-    bool Exists() const override;
-    krv::datasources::FileAccessState Delete() override;
-    krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
-    void WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override;
-    void Synchronize() override;
-    void Close() override;
-    krv::datasources::AccessCapabilities GetRasterCapabilities() override;
+
+protected:
+    void StoreRecord(const support::RecordText& oRecord) const override;
+    std::uint64_t MakeRoom(unsigned int nLevel) override;
+    std::unique_ptr<support::IBlockSource> MakeLevelSource(unsigned int nLevel, std::uint64_t nPlace) override;
 
 private:
-    bool IsWritable() const { return mpoFile != nullptr && mpoFile->IsWritable(); }
-    void UseFile(std::shared_ptr<DemoFile> poFile);
+    void ReadHeader();
+    std::string MakeHeader(const support::RecordText& oRecord) const;
+    // Of the image, level 1, or a level.
+    support::ImageLayout MakeLayout(unsigned int nLevel) const;
 
-    std::shared_ptr<DemoFile> mpoFile; // null before Create
-    Mode meMode;
+    std::shared_ptr<support::HeadedFile> mpoFile;
+    unsigned int mnWidth = 0;
+    unsigned int mnHeight = 0;
+    std::vector<krv::gobs::DataType> moTypes;
 };
 
 } // namespace krv::plugins::demo

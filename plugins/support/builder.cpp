@@ -33,4 +33,11 @@ void Builder::CheckReadOnly(const std::string& fileName, AccessMode eMode, const
             fileName + ": the format " + moFormat.GetShortName() + " cannot update files; open it read-only", oPlace);
 }
 
+void Builder::RefuseOptions(const std::string& fileName, const std::string& options, const Place& oPlace) const
+{
+    if (options.find_first_not_of(' ') != std::string::npos)
+        throw DataException(fileName + ": the format " + moFormat.GetShortName() + " has no options, not " + options,
+                            oPlace);
+}
+
 } // namespace krv::plugins::support

@@ -38,6 +38,9 @@ public:
 protected:
     // Throws DataException for eUpdate, for formats that only read.
     void CheckReadOnly(const std::string& fileName, AccessMode eMode, const Place& oPlace = Place::Current()) const;
+    // Throws DataException for options of a new file, for formats that have none.
+    void RefuseOptions(const std::string& fileName, const std::string& options,
+                       const Place& oPlace = Place::Current()) const;
 
 private:
     FormatDescription moFormat;

@@ -8,6 +8,7 @@
 #include "toolkit/nspio/warning.h"
 
 #include <cerrno>
+#include <climits>
 #include <cstdio>
 
 #include <sys/stat.h>
@@ -36,9 +37,18 @@ Dataset::Dataset(const std::string& fileName, krv::datasources::IFileFormat* poF
 {
 }
 
-Dataset::~Dataset() = default;
+Dataset::Dataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<FileWriter> poWriter)
+    : Dataset(poWriter->GetFileName(), poFormat)
+{
+    mpoWriter = std::move(poWriter);
+}
 
-void Dataset::SetImage(std::unique_ptr<IBlockSource> poSource)
+Dataset::~Dataset()
+{
+    Abandon();
+}
+
+void Dataset::SetImage(std::shared_ptr<IBlockSource> poSource)
 {
     mpoCache->Reserve(ThreeBlockRows(poSource->GetLayout()));
     mpoImage = std::make_shared<BlockImage>(std::move(poSource), mpoCache);
@@ -49,21 +59,51 @@ void Dataset::Refuse(const std::string& what, const Place& oPlace) const
     throw DataException(moName + ": " + what, oPlace);
 }
 
-void Dataset::WarnOfLoss() const noexcept
+void Dataset::Abandon() const noexcept
 {
-    if (std::uncaught_exceptions() > mnExceptions)
+    if (!mpoWriter)
         return;
     try
     {
         const Place oPlace = Place::Current();
-        krv::nspio::Warning::Warn(moName + ": the dataset goes without Synchronize or Close; what was written since "
-                                           "the last one is lost",
-                                  oPlace.GetSourceFile(), oPlace.GetLine());
+        if (mpoWriter->HasUnsaved() && std::uncaught_exceptions() <= mnExceptions)
+            krv::nspio::Warning::Warn(moName +
+                                          ": the dataset goes without Synchronize or Close; what was written since "
+                                          "the last one is lost",
+                                      oPlace.GetSourceFile(), oPlace.GetLine());
     }
     catch (...)
     {
         // A sink that throws has been told.
     }
+    mpoWriter->Discard();
+}
+
+void Dataset::CheckWriting(const char* pWhat, const Place& oPlace) const
+{
+    CheckOpen(oPlace);
+    if (!mpoWriter)
+        Refuse(std::string("the file is open for reading only: ") + pWhat, oPlace);
+    if (!mpoWriter->HasFile())
+        Refuse("the dataset has no image yet", oPlace);
+}
+
+void Dataset::CheckCreate(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes,
+                          const Place& oPlace) const
+{
+    CheckOpen(oPlace);
+    if (!mpoWriter || HasImage())
+        Refuse("an image exists already", oPlace);
+    if (nWidth == 0 || nHeight == 0 || nWidth > INT_MAX || nHeight > INT_MAX || oTypes.empty())
+        Refuse("an image of " + std::to_string(nWidth) + " x " + std::to_string(nHeight) + " pixels and " +
+                   std::to_string(oTypes.size()) + " channels cannot be laid out",
+               oPlace);
+}
+
+void Dataset::KeepExisting()
+{
+    if (mpoWriter)
+        mpoWriter->KeepExisting();
 }
 
 void Dataset::CheckOpen(const Place& oPlace) const
@@ -87,8 +127,10 @@ const ImageLayout& Dataset::GetLayout(const Place& oPlace) const
 
 krv::datasources::FileAccessState Dataset::Delete()
 {
+    if (mpoWriter)
+        mpoWriter->Discard();
     Close();
-    if (std::remove(moName.c_str()) == 0)
+    if ((mpoWriter && !mpoWriter->IsNamed()) || std::remove(moName.c_str()) == 0)
         return krv::datasources::eDone;
     return errno == ENOENT ? krv::datasources::eNotFound : krv::datasources::eDenied;
 }
@@ -96,7 +138,7 @@ krv::datasources::FileAccessState Dataset::Delete()
 bool Dataset::Exists() const
 {
     struct stat oStatus = {};
-    return ::stat(moName.c_str(), &oStatus) == 0;
+    return mpoWriter && !mpoWriter->IsNamed() ? mpoWriter->HasFile() : ::stat(moName.c_str(), &oStatus) == 0;
 }
 
 krv::datasources::AuxiliaryData Dataset::ReadAuxiliaryData()
@@ -124,10 +166,17 @@ bool Dataset::IsLinked() const
     return false;
 }
 
-void Dataset::Synchronize() {}
+void Dataset::Synchronize()
+{
+    CheckOpen();
+    if (mpoWriter)
+        mpoWriter->Synchronize();
+}
 
 void Dataset::Close()
 {
+    if (mpoWriter && !mpoWriter->IsEnded())
+        mpoWriter->Finish();
     mbOpen = false;
     mpoImage.reset();
 }
@@ -190,7 +239,7 @@ krv::datasources::IOverviewManager* Dataset::GetOverviewManager()
 
 krv::datasources::AccessCapabilities Dataset::GetRasterCapabilities()
 {
-    return {true, false, false};
+    return {true, mpoWriter != nullptr, mpoWriter != nullptr};
 }
 
 } // namespace krv::plugins::support

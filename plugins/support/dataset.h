@@ -6,6 +6,7 @@
 #include "plugins/support/image/blockcache.h"
 #include "plugins/support/image/blockimage.h"
 #include "plugins/support/image/iblocksource.h"
+#include "plugins/support/writing/filewriter.h"
 
 #include <exception>
 #include <memory>
@@ -17,7 +18,10 @@ namespace krv::plugins::support
 
 // A dataset of one file with one image, ready but for the image itself: a format derives from it, calls SetImage, and
 // overrides what it has more of. Writing, creating and changing are refused with a DataException that names the file
-// and the operation, there are no overviews, no history, no reference system and no metadata.
+// and the operation, there are no overviews, no history, no reference system and no metadata. With a FileWriter
+// Synchronize and Close make what was written the file's and report failure; a dataset that is destroyed without leaves
+// an existing file as of the last Synchronize, warns of what is lost, and removes a new file that was never
+// synchronised.
 class Dataset : public krv::datasources::IDataset,
                 public krv::datasources::IRasterDataset,
                 public krv::datasources::INewFileDataset
@@ -25,6 +29,8 @@ class Dataset : public krv::datasources::IDataset,
 public:
     // poFormat: the builder's, kept as a pointer. Operations that need the image throw DataException until SetImage.
     Dataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat);
+    // For a new file, or one that is changed.
+    Dataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<FileWriter> poWriter);
     ~Dataset() override;
     Dataset(const Dataset&) = delete;
     Dataset& operator=(const Dataset&) = delete;
@@ -32,6 +38,7 @@ public:
     krv::datasources::IFileFormat* GetFileFormat() const override { return mpoFormat; }
     // Closes the dataset and removes the file.
     krv::datasources::FileAccessState Delete() override;
+    // A new file exists from Create on, though it has its name only after Synchronize.
     bool Exists() const override;
     std::string GetName() override { return moName; }
     // An empty record with as many channels as the image has.
@@ -56,22 +63,28 @@ public:
     krv::datasources::IChannelInfo* GetChannelInfo(unsigned int nChannel) const override;
     krv::datasources::IHistoryIO* GetHistoryIO(unsigned int nChannel) override;
     krv::datasources::IOverviewManager* GetOverviewManager() override;
-    // Readable only.
     krv::datasources::AccessCapabilities GetRasterCapabilities() override;
 
-    void KeepExisting() override { mbReplaces = false; }
+    void KeepExisting() override;
+
+    // For what stands on the dataset.
+    const std::string& GetFileName() const { return moName; }
+    // Throws the DataException of a change to a file that is only read or has no image yet. pWhat: as for Refuse.
+    void CheckWriting(const char* pWhat, const Place& oPlace) const;
 
 protected:
-    // Whether a new file replaces one of its name.
-    bool Replaces() const { return mbReplaces; }
-    // For the destructor of a dataset that still has changes: warns that they are lost, unless an exception is on its
-    // way, which says more.
-    void WarnOfLoss() const noexcept;
+    // For the destructor of a dataset whose members the writer asks: warns when changes are lost, unless an exception
+    // is on its way, which says more, and discards them.
+    void Abandon() const noexcept;
+    // Whether the file is new or changed.
+    bool IsWritten() const { return mpoWriter != nullptr; }
+    // Throws DataException unless the image of a new file is to be laid out, and can be.
+    void CheckCreate(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes,
+                     const Place& oPlace) const;
     // Makes the source the dataset's image and bounds the cache: three rows of its blocks, at least 64 MiB, at most
     // 256.
-    void SetImage(std::unique_ptr<IBlockSource> poSource);
+    void SetImage(std::shared_ptr<IBlockSource> poSource);
     bool HasImage() const { return mpoImage != nullptr; }
-    const std::string& GetFileName() const { return moName; }
     // Throws DataException when closed or without an image.
     const std::shared_ptr<BlockImage>& GetImage(const Place& oPlace = Place::Current()) const;
     const ImageLayout& GetLayout(const Place& oPlace = Place::Current()) const;
@@ -85,8 +98,8 @@ private:
     krv::datasources::IFileFormat* mpoFormat;
     std::shared_ptr<BlockCache> mpoCache;
     std::shared_ptr<BlockImage> mpoImage;
+    std::shared_ptr<FileWriter> mpoWriter; // null when the file is only read
     bool mbOpen = true;
-    bool mbReplaces = true;
     int mnExceptions = std::uncaught_exceptions();
 };
 

@@ -8,6 +8,7 @@
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "plugins/support/dataset.h"
+#include "plugins/support/overviewmanager.h"
 #include "plugins/tif/reading/page.h"
 #include "plugins/tif/reading/pagelist.h"
 #include "plugins/tif/reading/strilesource.h"
@@ -27,9 +28,7 @@ namespace krv::plugins::tif
 
 // A TIFF file: the image is its first page. Reduced pages are its levels, mask pages its bitmaps, the colour map its
 // pseudocolour table (number 1, of channel 1). Opening for reading reads the first page only; the rest is looked at
-// when it is asked for. With an editor the file can be changed: Synchronize and Close make the changes the file's and
-// report failure; a dataset that is destroyed without leaves an existing file as of the last Synchronize, and removes a
-// new one that was never synchronised.
+// when it is asked for. With an editor the file can be changed.
 class TifDataset : public support::Dataset,
                    public krv::datasources::IGeocodedDataset,
                    public krv::datasources::IBitmapDataset,
@@ -45,21 +44,15 @@ public:
     TifDataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<FileEditor> poEditor);
     ~TifDataset() override;
 
-    krv::datasources::FileAccessState Delete() override;
-    void KeepExisting() override;
-    // A new file exists from Create on, though it has its name only after Synchronize.
-    bool Exists() const override;
     void Synchronize() override;
     // Types that differ throw DataException: a TIFF image has one.
     void Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes) override;
     using support::Dataset::Create;
-    krv::datasources::AccessCapabilities GetRasterCapabilities() override;
-
     void AddNewChannel(const krv::gobs::RasterInfo& oInfo) override;
     // Both make new pages of the image and its levels; I/O objects made before are of no more use.
     void DeleteChannel(unsigned int nChannel) override;
 
-    krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
+    krv::datasources::AuxiliaryData ReadAuxiliaryData() override { return ReadRecord(); }
     // Which levels are valid is not taken from the record: their manager keeps that.
     void WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override;
     void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;
@@ -103,41 +96,39 @@ public:
     void StoreEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock, const unsigned char* pBytes,
                       std::size_t nBytes) override;
 
-    // For the overview managers: the levels of the image or of its mask, and the pixels of a page.
+private:
+    class Levels;
+
+    // The other pages by what they are to the first one.
+    struct PageTable
+    {
+        std::vector<PageLevel> moLevels;
+        std::vector<PageSummary> moMasks;
+        std::vector<PageLevel> moMaskLevels;
+        unsigned int mnFurtherImages = 0;
+    };
+
+    // The levels of the image or of its mask, and the pixels of a page.
     const std::vector<PageLevel>& GetLevels(PixelUse eUse) const;
+    std::unique_ptr<support::LevelStore> MakeLevels(PixelUse eUse);
     // The number of the bitmap that the mask levels belong to; 0 when there is none.
     unsigned int GetLevelBitmap() const;
     std::shared_ptr<support::BlockImage> OpenPage(std::uint64_t nDirectory, PixelUse eUse);
     krv::datasources::AuxiliaryData ReadPageMetadata(std::uint64_t nDirectory) const;
-
-    // For the overview managers: making levels, and the state of each as the channels' tag "_Overview_<level>" has it:
-    // "valid" or "invalid", a blank and the resampling method when it is known. Without a tag a level is valid, and its
-    // method is what other programs say of all levels in the file's tag "IMAGE_STRUCTURE:OVERVIEW_RESAMPLING".
-    void CreateLevel(unsigned int nLevel, PixelUse eUse, const Place& oPlace);
-    void DeleteLevel(unsigned int nLevel, PixelUse eUse, const Place& oPlace);
-    bool IsLevelValid(unsigned int nChannel, unsigned int nLevel, PixelUse eUse) const;
-    void SetLevelValid(unsigned int nChannel, unsigned int nLevel, bool bValid, PixelUse eUse, const Place& oPlace);
-    std::string GetResamplingName(PixelUse eUse) const;
-    void SetResamplingName(const std::string& name, const Place& oPlace);
-
-private:
-    struct PageTable;
-
     void OpenImage();
     void ChangeChannels(const std::vector<unsigned int>& oSources, const Place& oPlace);
     std::uint64_t GetFullPage(PixelUse eUse) const;
     const krv::datasources::AuxiliaryData& GetBook(PixelUse eUse) const;
-    void WriteBook(const krv::datasources::AuxiliaryData& oBook, PixelUse eUse, const Place& oPlace);
     void WatchImage();
     void ForgetOldPixels();
     void StorePCT(const krv::gobs::PCT& oTable, const Place& oPlace);
-    std::unique_ptr<support::IBlockSource> MakeSource(const std::shared_ptr<PageModel>& poModel, PixelUse eUse);
+    std::shared_ptr<support::IBlockSource> MakeSource(const std::shared_ptr<PageModel>& poModel, PixelUse eUse);
     FileEditor& GetEditor(const char* pWhat, const Place& oPlace) const;
     // An operation that changes the structure of the file: all of it, or nothing when it throws.
     void Edit(const std::function<void()>& oAction) const;
     void AddPage(const std::shared_ptr<PageModel>& poPage, const Place& oPlace);
     void ForgetPages() const;
-    void ShowImage(std::unique_ptr<support::IBlockSource> poSource);
+    void ShowImage(std::shared_ptr<support::IBlockSource> poSource);
     Page& GetPage(const Place& oPlace = Place::Current()) const;
     const PageTable& GetPages() const;
     const PageSummary& GetMask(unsigned int nBitmap, const Place& oPlace) const;
@@ -149,6 +140,8 @@ private:
     std::uint64_t FindLevelPage(unsigned int nLevel, const Place& oPlace) const;
     Page& GetCodedPage(unsigned int nLevel, const Place& oPlace);
 
+    std::unique_ptr<support::LevelStore> mpoLevels;
+    std::unique_ptr<support::LevelStore> mpoMaskLevels;
     std::shared_ptr<FileEditor> mpoEditor; // null when the file is only read
     std::shared_ptr<support::File> mpoFile;
     mutable std::shared_ptr<Page> mpoPage;

@@ -1,12 +1,18 @@
 #include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/basicreader.h"
+#include "datasources/writer/basicwriter.h"
+#include "datasources/writer/overviewbuilder.h"
 #include "tests/support/pixels.h"
 #include "tests/support/recipe.h"
 #include "tests/support/thrown.h"
+#include "toolkit/ogc/cs/crsfactory.h"
+#include "toolkit/ogc/cs/geocodinginfo.h"
 #include "tools/conformance/conformance.h"
 #include "tools/conformance/tempfolder.h"
 
@@ -60,6 +66,7 @@ TEST(DemoFormat, HeadersAreHostile)
         {"DEMO1\n5 4\nBIT\n\n" + pixels, "file: FILE has channels of the unknown type BIT"},
         {"DEMO1\n5 4\n8U\n\n" + pixels.substr(1), SHORT},
         {"DEMO1\n5 4\n8U 8U\n\n" + pixels, SHORT},
+        {"DEMO1\n5 4\n8U\n[level 2]=99999999999999999999\n[level 0]=1\n[crs]=no\n[geocoding]=1 2\n\n" + pixels, ""},
         {"DEMO1\n2147483647 2147483647\nC64R C64R C64R\n\n" + pixels, SHORT},
     };
     for (const auto& [bytes, error] : HEADERS)
@@ -143,6 +150,44 @@ TEST(DemoFormat, NewFilesOfMixedTypesAreThereWhenTheyAreWhole)
     EXPECT_EQ(oRead.GetFileMetadata(), oTags.GetFileMetadata());
     EXPECT_EQ(oRead.GetChannelDescription(2), "[1]=red\r\n");
     EXPECT_EQ(oRead.GetChanMetadataValue("NO_DATA_VALUE", 3), "-1");
+}
+
+// Levels are built where they belong, and say so until the image changes.
+TEST(DemoFormat, PlaceAndLevelsComeBack)
+{
+    const krv::conformance::TempFolder oFolder;
+    const std::string file = oFolder.File("new.demo");
+    const krv::ogc::cs::GeocodingInfo oGeocoding(1e6 / 3, 0.1, 0, -5e6 / 7, 0, -1e-7);
+    {
+        const auto oNew = NewDemo(file);
+        Rasters(*oNew).Create(700, 500, {krv::gobs::eDT_16S, krv::gobs::eDT_16S});
+        WriteChannel(*oNew, 2, krv::test::RecipeImage(700, 500, {2}, krv::gobs::eDT_16S));
+        oNew->UpdateCRS(*krv::ogc::cs::CreateCRSFromEPSG(32633));
+        auto& oPlaced = dynamic_cast<IGeocodedDataset&>(*oNew);
+        EXPECT_THROW(oPlaced.SetGeocoding({0, 0, 0, 0, 0, 0}), krv::DataException);
+        oPlaced.SetGeocoding(oGeocoding);
+        BasicWriter oWriter(&Rasters(*oNew), {1, 2});
+        EXPECT_TRUE(BuildOverviews(oWriter, {4, 2, 16}, "average"));
+        std::unique_ptr<IOverviewManager>(Rasters(*oNew).GetOverviewManager())->DeleteLevel(4);
+        oNew->Close();
+    }
+    const std::unique_ptr<IDataset> oDataset(DatasetManager::GetInstance()->Open(file, eReadOnly));
+    EXPECT_TRUE(dynamic_cast<IGeocodedDataset&>(*oDataset).GetGeocoding() == oGeocoding);
+    EXPECT_EQ(std::unique_ptr<krv::ogc::cs::ICRS>(oDataset->ReadCRS())->GetEPSG(), 32633);
+    const std::unique_ptr<IOverviewManager> oLevels(Rasters(*oDataset).GetOverviewManager());
+    EXPECT_EQ(oLevels->GetLevels(), (std::vector<unsigned int>{2, 16}));
+    EXPECT_EQ(oLevels->GetResamplingName(), "AVERAGE");
+    EXPECT_TRUE(oLevels->IsValid(2, 16));
+    EXPECT_THROW(oLevels->CreateLevel(8), krv::DataException);
+    EXPECT_EQ(oLevels->GetLevelWidth(16), 44u);
+
+    const auto oNew = NewDemo(oFolder.File("other.demo"));
+    Rasters(*oNew).Create(40, 30, {krv::gobs::eDT_8U});
+    const std::unique_ptr<IOverviewManager> oOwn(Rasters(*oNew).GetOverviewManager());
+    oOwn->CreateLevel(2);
+    oOwn->SetValid(1, 2, true);
+    WriteChannel(*oNew, 1, std::string(1200, 'z'));
+    EXPECT_FALSE(oOwn->IsValid(1, 2));
 }
 
 TEST(DemoFormat, WhatCannotBeCreatedIsRefusedAndLeavesNothing)

@@ -97,7 +97,7 @@ private:
 };
 
 const FormatTraits FORMATS[] = {
-    {"DEMO", "demo", {""}, true, false, true},
+    {"DEMO", "demo", {""}, true, true, true},
     {"TIF",
      "tif",
      {"TILED=NO BLOCKYSIZE=17", "BLOCKXSIZE=64 BLOCKYSIZE=48 INTERLEAVE=BAND",

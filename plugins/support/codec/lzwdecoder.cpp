@@ -1,4 +1,4 @@
-#include "plugins/support/codec/lzwdecoder.h"
+#include "plugins/support/codec/lzw.h"
 
 #include "plugins/support/codec/detail/memoryaccess.h"
 
@@ -326,8 +326,6 @@ struct LzwDecoder::Table
 
 LzwDecoder::LzwDecoder() = default;
 LzwDecoder::~LzwDecoder() = default;
-LzwDecoder::LzwDecoder(LzwDecoder&&) noexcept = default;
-LzwDecoder& LzwDecoder::operator=(LzwDecoder&&) noexcept = default;
 
 bool LzwDecoder::IsOldStyle(const unsigned char* input, std::size_t nInput)
 {

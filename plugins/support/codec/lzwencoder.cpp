@@ -1,4 +1,4 @@
-#include "plugins/support/codec/lzwencoder.h"
+#include "plugins/support/codec/lzw.h"
 
 #include <array>
 #include <cstdint>
@@ -79,18 +79,21 @@ struct LzwEncoder::Table
 
 LzwEncoder::LzwEncoder() : mpoTable(std::make_unique<Table>()) {}
 LzwEncoder::~LzwEncoder() = default;
-LzwEncoder::LzwEncoder(LzwEncoder&&) noexcept = default;
-LzwEncoder& LzwEncoder::operator=(LzwEncoder&&) noexcept = default;
 
-std::size_t LzwEncoder::GetBound(std::size_t nInput)
+std::size_t LzwEncoder::GetBound(std::size_t nInput) const
 {
     // A code of at most 12 bits for every byte, clear codes, the end and a rest.
     return nInput + nInput / 2 + nInput / 2048 + 16;
 }
 
-std::size_t LzwEncoder::Encode(const unsigned char* input, std::size_t nInput, unsigned char* output, bool bOld)
+void LzwEncoder::TakeForm(std::span<const unsigned char> oLike)
 {
-    return bOld ? Run<true>(input, nInput, output) : Run<false>(input, nInput, output);
+    mbOld = LzwDecoder::IsOldStyle(oLike.data(), oLike.size());
+}
+
+std::size_t LzwEncoder::Encode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t)
+{
+    return mbOld ? Run<true>(input, nInput, output) : Run<false>(input, nInput, output);
 }
 
 template <bool bOld>

@@ -17,7 +17,8 @@ constexpr std::size_t STEP = 16;
 
 } // namespace
 
-Result DecodePackBits(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput)
+Result PackBitsDecoder::Decode(const unsigned char* input, std::size_t nInput, unsigned char* output,
+                               std::size_t nOutput)
 {
     const unsigned char* const stop = input + nInput;
     unsigned char* const end = output + nOutput;

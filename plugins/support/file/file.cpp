@@ -3,7 +3,6 @@
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
-#include <atomic>
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
@@ -95,11 +94,6 @@ void CopyRows(const unsigned char* pSource, std::size_t nSourcePitch, unsigned c
         std::memcpy(pTarget + nRow * nTargetPitch, pSource + nRow * nSourcePitch, nRowBytes);
 }
 
-[[noreturn]] void ThrowTaken(const std::string& fileName, const Place& oPlace)
-{
-    throw IOException(fileName, fileName + ": there is a file of that name meanwhile, which is not replaced", oPlace);
-}
-
 bool IsUnknownCall(int nError)
 {
     return nError == EINVAL || nError == ENOSYS || nError == EOPNOTSUPP || nError == EPERM;
@@ -136,30 +130,9 @@ std::string SystemErrorText(int nError)
     return strerror_r(nError, aText, sizeof(aText));
 }
 
-std::string MakeTemporaryName(const std::string& fileName, bool bReplace, const Place& oPlace)
+void ThrowNameTaken(const std::string& fileName, const Place& oPlace)
 {
-    struct stat oStatus = {};
-    if (fileName.empty() || fileName.back() == '/')
-        throw IOException(fileName, "\"" + fileName + "\": a new file has a name", oPlace);
-    if (::stat(fileName.c_str(), &oStatus) == 0 && !S_ISREG(oStatus.st_mode))
-        throw IOException(fileName, fileName + ": is not a plain file and is not replaced", oPlace);
-    if (!bReplace && ::lstat(fileName.c_str(), &oStatus) == 0)
-        ThrowTaken(fileName, oPlace);
-    if (::access(fileName.c_str(), W_OK) != 0 && errno != ENOENT && errno != ENOTDIR)
-        throw IOException(fileName, fileName + ": cannot be replaced: " + SystemErrorText(errno), oPlace);
-    const std::size_t nSlash = fileName.rfind('/');
-    const std::size_t nBegin = nSlash == std::string::npos ? 0 : nSlash + 1;
-    const std::string folder = nBegin == 0 ? "." : fileName.substr(0, nBegin == 1 ? 1 : nBegin - 1);
-    if (::access(folder.c_str(), W_OK | X_OK) != 0)
-    {
-        if (errno == ENOENT || errno == ENOTDIR)
-            throw FileNotFoundException(fileName, fileName + ": there is no folder " + folder + " to create it in",
-                                        oPlace);
-        throw IOException(fileName, fileName + ": cannot be created: " + SystemErrorText(errno), oPlace);
-    }
-    static std::atomic<unsigned int> nCounter = 0;
-    return fileName.substr(0, nBegin) + "." + fileName.substr(nBegin, 200) + "." + std::to_string(::getpid()) + "." +
-           std::to_string(nCounter++) + ".part";
+    throw IOException(fileName, fileName + ": there is a file of that name meanwhile, which is not replaced", oPlace);
 }
 
 File::File(const std::string& fileName, Mode eMode, const Place& oPlace) : moName(fileName), moPath(fileName)
@@ -348,7 +321,7 @@ void File::Rename(const std::string& fileName, bool bReplace, const Place& oPlac
     else if (std::rename(moPath.c_str(), fileName.c_str()) != 0)
         nError = errno;
     if (nError == EEXIST && !bReplace)
-        ThrowTaken(fileName, oPlace);
+        ThrowNameTaken(fileName, oPlace);
     if (nError != 0)
         throw IOException(fileName, fileName + ": cannot be put in its place: " + SystemErrorText(nError), oPlace);
     moPath = fileName;

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "plugins/support/image/scratch.h"
+#include "plugins/support/file/scratch.h"
 #include "toolkit/exceptions/place.h"
 
 #include <cstddef>
@@ -111,11 +111,8 @@ void HoldRoot(File& oFile, ReadRoot oReadRoot)
     }
 }
 
-// A name for what becomes fileName when it is whole: in the same folder, so that it can be renamed, of no length that a
-// folder does not take, and of this process alone. Throws FileNotFoundException when there is no such folder, and
-// IOException when the folder must not be written, when a folder, a device or the like has the name, or a file that
-// must not be written: renaming would put the file in its place. So does any file when bReplace is not set.
-std::string MakeTemporaryName(const std::string& fileName, bool bReplace, const Place& oPlace = Place::Current());
+// Throws the IOException that a file has the name, which is not to be replaced.
+[[noreturn]] void ThrowNameTaken(const std::string& fileName, const Place& oPlace);
 
 // The text of an error number, in the C locale.
 std::string SystemErrorText(int nError);

@@ -2,6 +2,7 @@
 
 #include "toolkit/exceptions/exceptions.h"
 
+#include <algorithm>
 #include <iterator>
 #include <utility>
 
@@ -31,6 +32,20 @@ void Space::AddGap(std::uint64_t nOffset, std::uint64_t nBytes)
 void Space::AddUnused(std::uint64_t nOffset, std::uint64_t nBytes)
 {
     moGivenUp.push_back({{nOffset, nBytes, 0}, 1});
+}
+
+void Space::AddUnusedBetween(std::vector<Extent> oPieces, std::uint64_t nEnd)
+{
+    oPieces.push_back({nEnd, 0, 0});
+    std::sort(oPieces.begin(), oPieces.end(),
+              [](const Extent& oFirst, const Extent& oSecond) { return oFirst.mnOffset < oSecond.mnOffset; });
+    std::uint64_t nDone = 0;
+    for (const Extent& oPiece : oPieces)
+    {
+        if (oPiece.mnOffset > nDone)
+            AddUnused(nDone, oPiece.mnOffset - nDone);
+        nDone = std::max(nDone, oPiece.GetEnd() + oPiece.GetEnd() % 2);
+    }
 }
 
 void Space::Keep(std::uint64_t nOffset, std::uint64_t nBytes)

@@ -20,6 +20,8 @@ struct Extent
     std::uint64_t mnOffset = 0;
     std::uint64_t mnBytes = 0;
     std::uint64_t mnGeneration = 0;
+
+    std::uint64_t GetEnd() const { return mnOffset + mnBytes; }
 };
 
 // Which parts of a file are free, for formats that never overwrite what the file as it stands on the disk may rely on:
@@ -37,6 +39,8 @@ public:
     void AddGap(std::uint64_t nOffset, std::uint64_t nBytes);
     // A piece that was given up before the file was opened; a reader of a state that is not known may need it.
     void AddUnused(std::uint64_t nOffset, std::uint64_t nBytes);
+    // The same for all that lies between pieces, given in any order, up to nEnd.
+    void AddUnusedBetween(std::vector<Extent> oPieces, std::uint64_t nEnd);
     // A piece that others may rely on: giving it up does not make it free.
     void Keep(std::uint64_t nOffset, std::uint64_t nBytes);
 

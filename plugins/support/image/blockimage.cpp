@@ -119,7 +119,7 @@ struct BlockImage::Job
     std::size_t mnPitch;
 };
 
-BlockImage::BlockImage(std::unique_ptr<IBlockSource> poSource, std::shared_ptr<BlockCache> poCache)
+BlockImage::BlockImage(std::shared_ptr<IBlockSource> poSource, std::shared_ptr<BlockCache> poCache)
     : mpoSource(std::move(poSource)), moLayout(mpoSource->GetLayout()), mpoCache(std::move(poCache)),
       mbParts(mpoSource->ReadsParts())
 {

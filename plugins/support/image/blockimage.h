@@ -1,9 +1,9 @@
 #pragma once
 
 #include "plugins/support/codec/interleave.h"
+#include "plugins/support/file/scratch.h"
 #include "plugins/support/image/blockcache.h"
 #include "plugins/support/image/iblocksource.h"
-#include "plugins/support/image/scratch.h"
 #include "toolkit/exceptions/place.h"
 
 #include <cstddef>
@@ -55,7 +55,7 @@ class BlockImage
 {
 public:
     // oCache: shared by the images of one dataset.
-    BlockImage(std::unique_ptr<IBlockSource> poSource, std::shared_ptr<BlockCache> poCache);
+    BlockImage(std::shared_ptr<IBlockSource> poSource, std::shared_ptr<BlockCache> poCache);
     ~BlockImage();
     BlockImage(const BlockImage&) = delete;
     BlockImage& operator=(const BlockImage&) = delete;
@@ -110,7 +110,7 @@ private:
     void NoteWindow(const Range& oRange, unsigned int nPlane);
     BlockCache& GetCache() const { return mbParts ? *mpoRowCache : *mpoCache; }
 
-    std::unique_ptr<IBlockSource> mpoSource;
+    std::shared_ptr<IBlockSource> mpoSource;
     const ImageLayout& moLayout;
     std::shared_ptr<BlockCache> mpoCache;
     // For sources that read parts: few blocks suffice, and few stay in the processor's own caches.

@@ -1,7 +1,7 @@
 #pragma once
 
+#include "plugins/support/file/scratch.h"
 #include "plugins/support/image/imagelayout.h"
-#include "plugins/support/image/scratch.h"
 
 #include <memory>
 #include <vector>

@@ -1,5 +1,6 @@
 #include "plugins/tif/reading/page.h"
 
+#include "plugins/tif/reading/compression.h"
 #include "plugins/tif/reading/plaindirectory.h"
 #include "toolkit/exceptions/exceptions.h"
 
@@ -34,14 +35,6 @@ std::string CodecName(std::uint16_t nCompression)
     const TIFFCodec* poCodec = TIFFFindCODEC(nCompression);
     const std::string number = std::to_string(nCompression);
     return poCodec != nullptr ? std::string(poCodec->name) + " (" + number + ")" : number;
-}
-
-// The tag belongs to these codecs alone; for others libtiff's answer is undefined.
-bool HasPredictor(std::uint16_t nCompression)
-{
-    return nCompression == COMPRESSION_LZW || nCompression == COMPRESSION_DEFLATE ||
-           nCompression == COMPRESSION_ADOBE_DEFLATE || nCompression == COMPRESSION_ZSTD ||
-           nCompression == COMPRESSION_LZMA;
 }
 
 // Codecs that know one width of sample only; what libtiff makes of others is undefined.

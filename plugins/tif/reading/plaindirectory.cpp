@@ -1,5 +1,7 @@
 #include "plugins/tif/reading/plaindirectory.h"
 
+#include "plugins/tif/reading/compression.h"
+
 #include <algorithm>
 #include <iterator>
 
@@ -94,22 +96,6 @@ bool HasItsColours(const RawDirectory& oDirectory, PeekReader& oReader, std::uin
 }
 
 } // namespace
-
-bool IsOwnCompression(std::uint64_t nCompression)
-{
-    switch (nCompression)
-    {
-    case COMPRESSION_NONE:
-    case COMPRESSION_LZW:
-    case COMPRESSION_PACKBITS:
-    case COMPRESSION_ZSTD:
-    case COMPRESSION_DEFLATE:
-    case COMPRESSION_ADOBE_DEFLATE:
-        return true;
-    default:
-        return false;
-    }
-}
 
 bool IsPlainDirectory(const RawDirectory& oDirectory, PeekReader& oReader)
 {

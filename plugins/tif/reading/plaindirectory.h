@@ -13,7 +13,4 @@ namespace krv::plugins::tif
 // directory says the same to everybody; what libtiff makes of any other, it has to be asked.
 bool IsPlainDirectory(const RawDirectory& oDirectory, PeekReader& oReader);
 
-// Whether blocks of the compression are decoded here, not by libtiff.
-bool IsOwnCompression(std::uint64_t nCompression);
-
 } // namespace krv::plugins::tif

@@ -26,12 +26,16 @@ void ThrowDamaged(const std::string& fileName, const std::string& what, const Pl
     throw FileFormatException(fileName, fileName + ": " + what + "; the file is damaged", oPlace);
 }
 
-std::uint64_t ReadNumber(const unsigned char* pBytes, std::size_t nBytes, bool bBigEndian)
+FileHeader ReadHeader(PeekReader& oReader)
 {
-    std::uint64_t nValue = 0;
-    for (std::size_t nAt = 0; nAt < nBytes; ++nAt)
-        nValue = nValue << 8 | pBytes[bBigEndian ? nAt : nBytes - 1 - nAt];
-    return nValue;
+    const support::File& oFile = oReader.GetFile();
+    unsigned char aHeader[FileHeader::BYTES] = {};
+    oReader.Forget();
+    const std::size_t nBytes = oReader.Read(0, aHeader, sizeof(aHeader));
+    const std::optional<FileHeader> oHeader = FileHeader::Parse(aHeader, nBytes);
+    if (!oHeader)
+        throw FileFormatException(oFile.GetName(), oFile.GetName() + ": is no TIFF file");
+    return *oHeader;
 }
 
 std::size_t GetTypeBytes(std::uint16_t nType)

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "plugins/support/file/numbers.h"
 #include "plugins/tif/reading/peekreader.h"
 #include "toolkit/exceptions/place.h"
 
@@ -29,8 +30,10 @@ struct FileHeader
     std::size_t GetBytes() const { return mbBigTiff ? 16 : 8; }
 };
 
-// Whole numbers of 1, 2, 4 or 8 bytes in the byte order of a file.
-std::uint64_t ReadNumber(const unsigned char* pBytes, std::size_t nBytes, bool bBigEndian);
+using support::ReadNumber;
+
+// Throws FileFormatException for a file that is none.
+FileHeader ReadHeader(PeekReader& oReader);
 
 // Throws FileFormatException "<file>: <what>; the file is damaged".
 [[noreturn]] void ThrowDamaged(const std::string& fileName, const std::string& what, const Place& oPlace);

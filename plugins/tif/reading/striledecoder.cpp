@@ -1,7 +1,7 @@
 #include "plugins/tif/reading/striledecoder.h"
 
 #include "plugins/support/codec/bits.h"
-#include "plugins/support/codec/packbits.h"
+#include "plugins/tif/reading/compression.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <bit>
@@ -41,22 +41,6 @@ void StrileDecoder::Relax()
 codec::SampleOrder StrileDecoder::GetOrder() const
 {
     return moForm.mbBigEndian == BIG_ENDIAN_MACHINE ? codec::SampleOrder::eNative : codec::SampleOrder::eSwapped;
-}
-
-codec::Result StrileDecoder::DecodeOwn(const unsigned char* pRaw, std::size_t nRaw, unsigned char* pTarget,
-                                       std::size_t nBytes)
-{
-    switch (moForm.mnCompression)
-    {
-    case COMPRESSION_LZW:
-        return moLzw.Decode(pRaw, nRaw, pTarget, nBytes);
-    case COMPRESSION_PACKBITS:
-        return codec::DecodePackBits(pRaw, nRaw, pTarget, nBytes);
-    case COMPRESSION_ZSTD:
-        return moZstd.Decode(pRaw, nRaw, pTarget, nBytes);
-    default:
-        return moDeflate.Decode(pRaw, nRaw, pTarget, nBytes);
-    }
 }
 
 // The library behind JBIG ends the process when the size in a stream asks for more memory than there is.
@@ -128,7 +112,9 @@ void StrileDecoder::Decode(std::uint32_t nStrile, std::uint32_t nStoredRows, uns
         DecodeByLibrary(nStrile, pRaw, nRaw, pStored, nBytes);
         return ConvertDecoded(pStored, nStoredPitch, oWanted);
     }
-    const codec::Result oResult = DecodeOwn(pRaw, nRaw, pStored, nBytes);
+    if (!mpoDecoder)
+        mpoDecoder = FindCompression(moForm.mnCompression)->mpCodec->mpMakeDecoder();
+    const codec::Result oResult = mpoDecoder->Decode(pRaw, nRaw, pStored, nBytes);
     if (!oResult.IsDone())
         moPage.Fail(Describe(nStrile) + ": " + codec::StatusText(oResult.moStatus));
     const bool bLastStrip = !moForm.mbTiled && (nStrile + 1) % moForm.mnStrilesDown == 0;

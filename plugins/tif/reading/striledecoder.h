@@ -1,15 +1,14 @@
 #pragma once
 
-#include "plugins/support/codec/deflatedecoder.h"
-#include "plugins/support/codec/lzwdecoder.h"
+#include "plugins/support/codec/blockcodec.h"
 #include "plugins/support/codec/predictor.h"
-#include "plugins/support/codec/zstddecoder.h"
-#include "plugins/support/image/scratch.h"
+#include "plugins/support/file/scratch.h"
 #include "plugins/tif/reading/jpegheader.h"
 #include "plugins/tif/reading/page.h"
 
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <optional>
 #include <span>
 #include <string>
@@ -54,7 +53,6 @@ public:
     void Relax();
 
 private:
-    codec::Result DecodeOwn(const unsigned char* pRaw, std::size_t nRaw, unsigned char* pTarget, std::size_t nBytes);
     void DecodeByLibrary(std::uint32_t nStrile, unsigned char* pRaw, std::size_t nRaw, unsigned char* pTarget,
                          std::size_t nBytes);
     void PrepareJpeg(std::uint32_t nStrile, std::span<unsigned char>& oRaw);
@@ -66,9 +64,7 @@ private:
 
     Page& moPage;
     const PageForm& moForm;
-    codec::DeflateDecoder moDeflate;
-    codec::LzwDecoder moLzw;
-    codec::ZstdDecoder moZstd;
+    std::unique_ptr<codec::BlockDecoder> mpoDecoder; // made when it is wanted
     std::optional<JpegCompleter> moJpeg;
     support::Scratch moScratch;
     std::vector<unsigned char> moPredictorScratch;

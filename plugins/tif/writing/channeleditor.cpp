@@ -22,8 +22,7 @@ bool IsSeparate(const TagList& oTags)
 
 std::unique_ptr<support::BlockImage> MakeImage(std::shared_ptr<PageWriter> poWriter)
 {
-    return std::make_unique<support::BlockImage>(std::make_unique<EditedSource>(std::move(poWriter)),
-                                                 std::make_shared<support::BlockCache>());
+    return std::make_unique<support::BlockImage>(std::move(poWriter), std::make_shared<support::BlockCache>());
 }
 
 std::vector<unsigned int> Count(std::size_t nCount)

@@ -1,7 +1,7 @@
 #include "plugins/tif/writing/cloudlayout.h"
 
+#include "plugins/support/file/roomrecord.h"
 #include "plugins/tif/writing/directorybytes.h"
-#include "plugins/tif/writing/roomrecord.h"
 
 #include <algorithm>
 #include <cstdint>
@@ -107,7 +107,7 @@ void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, con
     support::Space oSpace(oTarget.GetName(), oHeader.GetBytes(), oHeader.mbBigTiff ? INT64_MAX : UINT32_MAX,
                           "the file would pass the limit of 4 GiB of classic TIFF");
     for (Placed& oPlaced : oSorted)
-        PlaceDirectory(oPlaced, oHeader, &oPlaced == oSorted.data() ? RoomRecord::GetBytes(0) : 0, oSpace);
+        PlaceDirectory(oPlaced, oHeader, &oPlaced == oSorted.data() ? support::RoomRecord::GetBytes(0) : 0, oSpace);
     for (auto oPlaced = oSorted.rbegin(); oPlaced != oSorted.rend(); ++oPlaced)
         CopyBlocks(*oPlaced, oSource, oSpace, oTarget);
     for (std::size_t nAt = 0; nAt < oSorted.size(); ++nAt)
@@ -116,7 +116,7 @@ void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, con
     // All of the file was written here.
     const Extent& oRoot = oSorted.front().moPage.moDirectory;
     const std::uint64_t nRecord = oRoot.mnOffset + GetDirectoryBytes(oSorted.front().moPage, oHeader);
-    RoomRecord oRecord;
+    support::RoomRecord oRecord;
     oRecord.mnFileBytes = std::max(oTarget.GetSize(), nRecord + oRecord.GetBytes());
     oTarget.Write(nRecord, oRecord.Make(oRoot.mnOffset).data(), oRecord.GetBytes());
     unsigned char aHeader[FileHeader::BYTES] = {};

@@ -1,10 +1,12 @@
 #pragma once
 
+#include "plugins/support/writing/options.h"
 #include "toolkit/exceptions/place.h"
 
 #include <cstdint>
 #include <optional>
 #include <string>
+#include <vector>
 
 namespace krv::plugins::tif
 {
@@ -36,9 +38,8 @@ struct CreateOptions
     // options: KEY=VALUE, separated by blanks, in any letter case. Throws DataException naming a key or a value that is
     // not known.
     static CreateOptions Parse(const std::string& options, const Place& oPlace = Place::Current());
+    // The keys as users are told of them.
+    static std::vector<support::Options::Description> Describe();
 };
-
-// Whether a codec takes differences.
-bool HasPredictor(std::uint16_t nCompression);
 
 } // namespace krv::plugins::tif

@@ -1,5 +1,6 @@
 #include "plugins/tif/writing/encodedform.h"
 
+#include "plugins/tif/reading/compression.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -15,33 +16,6 @@ namespace
 {
 
 using krv::datasources::EncodedForm;
-
-struct Codec
-{
-    const char* mpName;
-    std::uint16_t mnCode;
-    bool mbLossy;
-};
-
-// The first of a name is the one that is written. LERC and WebP may have kept every value; that shows in no tag.
-constexpr Codec CODECS[] = {{"NONE", COMPRESSION_NONE, false},
-                            {"DEFLATE", COMPRESSION_ADOBE_DEFLATE, false},
-                            {"DEFLATE", COMPRESSION_DEFLATE, false},
-                            {"LZW", COMPRESSION_LZW, false},
-                            {"ZSTD", COMPRESSION_ZSTD, false},
-                            {"PACKBITS", COMPRESSION_PACKBITS, false},
-                            {"LZMA", COMPRESSION_LZMA, false},
-                            {"JPEG", COMPRESSION_JPEG, true},
-                            {"WEBP", COMPRESSION_WEBP, true},
-                            {"LERC", COMPRESSION_LERC, true},
-                            {"PIXARLOG", COMPRESSION_PIXARLOG, true},
-                            {"CCITTRLE", COMPRESSION_CCITTRLE, false},
-                            {"CCITTRLEW", COMPRESSION_CCITTRLEW, false},
-                            {"CCITTFAX3", COMPRESSION_CCITTFAX3, false},
-                            {"CCITTFAX4", COMPRESSION_CCITTFAX4, false},
-                            {"JBIG", COMPRESSION_JBIG, false},
-                            {"NEXT", COMPRESSION_NEXT, false},
-                            {"THUNDERSCAN", COMPRESSION_THUNDERSCAN, false}};
 
 // Tags that decoders go by.
 struct Parameter
@@ -162,12 +136,11 @@ EncodedForm DescribeBlocks(Page& oPage)
 {
     const PageForm& oForm = oPage.GetForm();
     EncodedForm oBlocks;
-    const auto* const pCodec = std::find_if(std::begin(CODECS), std::end(CODECS),
-                                            [&](const Codec& oCodec) { return oCodec.mnCode == oForm.mnCompression; });
-    if (pCodec != std::end(CODECS))
-        oBlocks.moCodec = pCodec->mpName;
-    oBlocks.mbReadable = pCodec != std::end(CODECS) && CanBeTold(oPage);
-    oBlocks.mbLossy = pCodec == std::end(CODECS) || pCodec->mbLossy;
+    const Compression* const pCodec = FindCompression(oForm.mnCompression);
+    if (pCodec != nullptr)
+        oBlocks.moCodec = pCodec->moName;
+    oBlocks.mbReadable = pCodec != nullptr && CanBeTold(oPage);
+    oBlocks.mbLossy = pCodec == nullptr || pCodec->mbLossy;
     oBlocks.mnPredictor = oForm.mnPredictor;
     oBlocks.mbBigEndian = oForm.mbBigEndian && HasByteOrder(oForm);
     oBlocks.mbSeparate = oForm.mbSeparate;
@@ -195,9 +168,8 @@ EncodedForm DescribeBlocks(Page& oPage)
 
 std::shared_ptr<PageModel> MakeEncodedPage(const PageModel& oPage, const EncodedForm& oForm)
 {
-    const auto* const pCodec = std::find_if(std::begin(CODECS), std::end(CODECS),
-                                            [&](const Codec& oCodec) { return oForm.moCodec == oCodec.mpName; });
-    if (pCodec == std::end(CODECS) || oForm.mnBlockWidth == 0 || oForm.mnBlockHeight == 0 || oForm.mnChannels == 0 ||
+    const Compression* const pCodec = FindCompression(oForm.moCodec);
+    if (pCodec == nullptr || oForm.mnBlockWidth == 0 || oForm.mnBlockHeight == 0 || oForm.mnChannels == 0 ||
         oForm.mnChannels > UINT16_MAX)
         return nullptr;
     auto poPage = std::make_shared<PageModel>(oPage.moTags.IsBigEndian());

@@ -1,10 +1,11 @@
 #pragma once
 
 #include "plugins/support/file/file.h"
+#include "plugins/support/file/roomrecord.h"
 #include "plugins/support/file/space.h"
+#include "plugins/support/writing/filewriter.h"
 #include "plugins/tif/reading/page.h"
 #include "plugins/tif/writing/pagemodel.h"
-#include "plugins/tif/writing/roomrecord.h"
 
 #include <cstdint>
 #include <memory>
@@ -20,9 +21,8 @@ class PageWriter;
 // A TIFF file that is being written. Its structure is kept here, in memory; blocks and directories are only ever added
 // to the file, beside what its committed state uses. Synchronize writes the new directories and makes them the file's
 // by changing one number: the place of the first directory. A file that is left at any moment is therefore as of the
-// last Synchronize. A new file lies under a temporary name in its folder until the first Synchronize gives it its own;
-// an editor that goes before removes it. One thread at a time.
-class FileEditor : public std::enable_shared_from_this<FileEditor>
+// last Synchronize. One thread at a time.
+class FileEditor : public support::FileWriter, public std::enable_shared_from_this<FileEditor>
 {
 public:
     class Operation;
@@ -34,22 +34,12 @@ public:
     // Bytes that the state of a file which a header names leaves unused; no value when other programs may use them.
     static std::optional<std::uint64_t> CountUnusedBytes(std::shared_ptr<support::File> poFile,
                                                          const FileHeader& oHeader);
-    ~FileEditor();
-    FileEditor(const FileEditor&) = delete;
-    FileEditor& operator=(const FileEditor&) = delete;
+    ~FileEditor() override;
 
-    const std::string& GetFileName() const { return moFileName; }
     const CreateOptions& GetOptions() const { return moOptions; }
-    const std::shared_ptr<support::File>& GetFile() const { return mpoFile; }
     const FileHeader& GetHeader() const { return moHeader; }
-    // Whether the file has its pages, under whatever name.
+    // Whether a new file was laid out.
     bool HasPages() const { return !moPages.empty(); }
-    // A new file takes its name only when nobody has it.
-    void KeepExisting() { mbReplaces = false; }
-    // Whether something would be lost if the editor went now.
-    bool HasUnsaved() const;
-    // Whether the file lies under its own name.
-    bool IsNamed() const { return mbNamed; }
     std::vector<PageSummary> Summarise() const;
     // The chain, then the pages that the first one lists.
     const std::vector<std::shared_ptr<PageModel>>& GetPages() const { return moPages; }
@@ -90,18 +80,27 @@ public:
 
     // Whether anything changed since the last Synchronize; blocks that are held back do not count.
     bool IsChanged() const;
-    void Synchronize();
-    // The same for the last time: lays the file out as its options say. Pages are of no use afterwards.
-    void Finish();
-    // Ends writing, without storing anything. Reading goes on.
-    void End();
-    bool IsEnded() const { return mbEnded; }
-    void CheckWritable(const Place& oPlace = Place::Current()) const;
-    // Ends writing, removes a new file that has not got its name, and what was added to another since it was committed.
-    void Discard() noexcept;
+    // Lays the file out as its options say. Pages are of no use afterwards.
+    void Finish() override;
+    // What was added to an existing file since it was committed is cut off again.
+    void Discard() noexcept override;
+
+protected:
+    void Store() override;
+    bool HoldsChanges() const override;
 
 private:
-    struct Written;
+    static constexpr std::uint64_t MAXIMUM_STRILES = std::uint64_t{1} << 28;
+
+    // A directory that was written and the places of what it names, until it is committed.
+    struct Written
+    {
+        PageModel* mpPage = nullptr;
+        Extent moDirectory;
+        std::uint64_t mnNext = 0;
+        Extent moOffsetArray;
+        Extent moCountArray;
+    };
 
     // Over a file that is open already; one that is open for reading only is looked at.
     FileEditor(std::shared_ptr<support::File> poFile, const std::optional<FileHeader>& oHeader);
@@ -109,7 +108,6 @@ private:
     // What nothing in the file names is unused where this library alone wrote.
     void FindUnused();
     std::vector<Extent> ListUsed() const;
-    bool SharesOwn(const std::vector<Extent>& oPieces) const;
     void ReadPage(std::uint64_t nOffset, bool bBelowFirst, std::uint64_t& nNext);
     void ReadStriles(PageModel& oPage, const RawDirectory& oDirectory);
     // Counts what the structure takes in memory. Throws FileFormatException when it is more than a sound file's.
@@ -131,10 +129,7 @@ private:
     bool IsWasteful() const;
     [[noreturn]] void Fail(const std::string& what, const Place& oPlace = Place::Current()) const;
 
-    std::string moFileName;
     CreateOptions moOptions;
-    std::string moTemporary; // of a new file, until it has its own name
-    std::shared_ptr<support::File> mpoFile;
     FileHeader moHeader;
     std::unique_ptr<support::Space> mpoSpace;
     std::vector<std::shared_ptr<PageModel>> moPages;
@@ -143,13 +138,10 @@ private:
     std::uint64_t mnModelBytes = UINT64_MAX; // that the structure may still take
     std::uint64_t mnCommittedSize = 0;       // of the file with all that its committed state may use
     std::vector<Extent> moReleased;          // of pages that are gone
-    RoomRecord moRecord;                     // that goes with the next state
+    support::RoomRecord moRecord;            // that goes with the next state
     bool mbChanged = false;                  // pages came or went
     bool mbBelowFirst = false;               // the first page listed others when the file was opened
     bool mbOperation = false;                // one is under way
-    bool mbEnded = false;
-    bool mbNamed = true;
-    bool mbReplaces = true;
 };
 
 // An operation on the structure of a file: pages that come, go or get other tags. All of it is undone, in memory and in

@@ -1,6 +1,6 @@
 #include "plugins/tif/writing/pagemodel.h"
 
-#include "plugins/tif/writing/strileencoder.h"
+#include "plugins/tif/reading/compression.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -272,7 +272,7 @@ std::shared_ptr<PageModel> MakeReducedPage(const PageModel& oFull, std::uint32_t
         if (const Tag* pTag = oFull.moTags.Find(nTag))
             oTags.Set(CopyTag(*pTag));
     const std::uint64_t nCompression = oTags.GetNumber(TIFFTAG_COMPRESSION, COMPRESSION_NONE);
-    if (!StrileEncoder::CanEncode(static_cast<std::uint16_t>(nCompression)))
+    if (!CanEncode(nCompression))
         oTags.SetNumber(TIFFTAG_COMPRESSION, TIFF_SHORT, COMPRESSION_ADOBE_DEFLATE); // that one is only read
     oTags.SetNumber(TIFFTAG_IMAGEWIDTH, TIFF_LONG, nWidth);
     oTags.SetNumber(TIFFTAG_IMAGELENGTH, TIFF_LONG, nHeight);

@@ -1,6 +1,5 @@
 #include "plugins/tif/writing/pagewriter.h"
 
-#include "plugins/support/codec/interleave.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -17,32 +16,26 @@ constexpr std::uint64_t MOST_HELD_BYTES = std::uint64_t{256} << 20;
 // Uncompressed strips and tiles above this size get rows written into them instead of being held.
 constexpr std::uint64_t IN_PLACE_BYTES = std::uint64_t{8} << 20;
 
-support::PixelRect Intersect(const support::PixelRect& oFirst, const support::PixelRect& oSecond)
+// Two rows of blocks, so that an image that comes row by row encodes every block once.
+std::size_t ChooseBound(const PageForm& oForm, std::size_t nPixelBytes)
 {
-    const unsigned int nX = std::max(oFirst.mnX, oSecond.mnX);
-    const unsigned int nY = std::max(oFirst.mnY, oSecond.mnY);
-    const unsigned int nRight = std::min(oFirst.mnX + oFirst.mnWidth, oSecond.mnX + oSecond.mnWidth);
-    const unsigned int nBottom = std::min(oFirst.mnY + oFirst.mnHeight, oSecond.mnY + oSecond.mnHeight);
-    if (nRight <= nX || nBottom <= nY)
-        return {};
-    return {nX, nY, nRight - nX, nBottom - nY};
+    const std::uint64_t nRow = std::uint64_t{oForm.mnWidth} * nPixelBytes * oForm.GetPlanes();
+    const std::uint64_t nRows = std::uint64_t{2} * oForm.mnStrileHeight;
+    return static_cast<std::size_t>(
+        std::clamp(nRow > MOST_HELD_BYTES ? MOST_HELD_BYTES : nRow * std::min(nRows, MOST_HELD_BYTES), LEAST_HELD_BYTES,
+                   MOST_HELD_BYTES));
 }
 
 } // namespace
 
-EditedSource::~EditedSource() = default;
-
-// Two rows of blocks, so that an image that comes row by row encodes every block once.
 PageWriter::PageWriter(std::shared_ptr<FileEditor> poEditor, std::shared_ptr<PageModel> poModel,
                        std::shared_ptr<Page> poPage, PixelUse eUse)
     : mpoEditor(std::move(poEditor)), mpoModel(std::move(poModel)), mpoPage(std::move(poPage)),
-      moForm(mpoPage->GetForm()), moReader(mpoPage, eUse), moEncoder(*mpoPage, eUse, mpoEditor->GetOptions().moLevel)
+      moForm(mpoPage->GetForm()), moReader(mpoPage, eUse), moEncoder(*mpoPage, eUse, mpoEditor->GetOptions().moLevel),
+      moHeld(ChooseBound(moForm, GetPixelBytes()), GetPixelBytes(),
+             [this](const support::HeldBlocks::Block& oBlock, const unsigned char* pPixels)
+             { Store(oBlock, pPixels, oBlock.moRect.mnWidth * GetPixelBytes()); })
 {
-    const std::uint64_t nRow = std::uint64_t{moForm.mnWidth} * GetPixelBytes() * moForm.GetPlanes();
-    const std::uint64_t nRows = std::uint64_t{2} * moForm.mnStrileHeight;
-    mnBound = static_cast<std::size_t>(
-        std::clamp(nRow > MOST_HELD_BYTES ? MOST_HELD_BYTES : nRow * std::min(nRows, MOST_HELD_BYTES), LEAST_HELD_BYTES,
-                   MOST_HELD_BYTES));
 }
 
 PageWriter::~PageWriter() = default;
@@ -74,33 +67,20 @@ support::PixelRect PageWriter::ToImage(const support::BlockAddress& oBlock, cons
             oBlock.mnRow * GetLayout().GetBlockHeight() + oPart.mnY, oPart.mnWidth, oPart.mnHeight};
 }
 
-void PageWriter::Read(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
-                      std::size_t nPitch)
+void PageWriter::ReadBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
+                           std::size_t nPitch)
 {
     CheckPage();
     moReader.ReadBlock(oBlock, oPart, pTarget, nPitch);
-    if (moHeld.empty())
+    if (moHeld.IsEmpty())
         return;
     const support::PixelRect oRect = ToImage(oBlock, oPart);
     ForEach(oBlock.mnPlane, oRect,
-            [&](const Strile& oStrile)
-            {
-                const auto oFound = moIndex.find(oStrile.mnNumber);
-                if (oFound == moIndex.end())
-                    return;
-                const support::PixelRect oShared = Intersect(oRect, oStrile.moRect);
-                const std::size_t nHeldPitch = oStrile.moRect.mnWidth * GetPixelBytes();
-                codec::CopyRows(oFound->second->moPixels.data() + (oShared.mnY - oStrile.moRect.mnY) * nHeldPitch +
-                                    (oShared.mnX - oStrile.moRect.mnX) * GetPixelBytes(),
-                                nHeldPitch,
-                                pTarget + (oShared.mnY - oRect.mnY) * nPitch +
-                                    (oShared.mnX - oRect.mnX) * GetPixelBytes(),
-                                nPitch, oShared.mnWidth * GetPixelBytes(), oShared.mnHeight);
-            });
+            [&](const Strile& oStrile) { moHeld.Overlay(oStrile.mnNumber, oRect, pTarget, nPitch); });
 }
 
-void PageWriter::Write(const support::BlockAddress& oBlock, const support::PixelRect& oPart,
-                       const unsigned char* pSource, std::size_t nPitch)
+void PageWriter::WriteBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart,
+                            const unsigned char* pSource, std::size_t nPitch)
 {
     mpoEditor->CheckWritable();
     CheckPage();
@@ -110,7 +90,7 @@ void PageWriter::Write(const support::BlockAddress& oBlock, const support::Pixel
     ForEach(oBlock.mnPlane, oRect,
             [&](const Strile& oStrile)
             {
-                const support::PixelRect oShared = Intersect(oRect, oStrile.moRect);
+                const support::PixelRect oShared = support::Intersect(oRect, oStrile.moRect);
                 WritePart(oStrile, oShared,
                           pSource + (oShared.mnY - oRect.mnY) * nPitch + (oShared.mnX - oRect.mnX) * GetPixelBytes(),
                           nPitch);
@@ -131,18 +111,18 @@ void PageWriter::WritePart(const Strile& oStrile, const support::PixelRect& oPar
 {
     if (oPart == oStrile.moRect)
     {
-        Store(oStrile, pSource, nPitch);
-        return Forget(oStrile.mnNumber);
+        Store({oStrile.mnNumber, oStrile.moRect}, pSource, nPitch);
+        return moHeld.Forget(oStrile.mnNumber);
     }
     const std::uint64_t nBytes = std::uint64_t{oStrile.moRect.mnWidth} * oStrile.moRect.mnHeight * GetPixelBytes();
     if (nBytes > IN_PLACE_BYTES && moEncoder.IsPlain())
         return WriteInPlace(oStrile, oPart, pSource, nPitch);
-    Held& oHeld = Hold(oStrile);
-    const std::size_t nHeldPitch = oStrile.moRect.mnWidth * GetPixelBytes();
-    codec::CopyRows(pSource, nPitch,
-                    oHeld.moPixels.data() + (oPart.mnY - oStrile.moRect.mnY) * nHeldPitch +
-                        (oPart.mnX - oStrile.moRect.mnX) * GetPixelBytes(),
-                    nHeldPitch, oPart.mnWidth * GetPixelBytes(), oPart.mnHeight);
+    const auto Read = [&](unsigned char* pPixels, std::size_t nHeldPitch)
+    {
+        if (mpoModel->Get(oStrile.mnNumber).IsStored())
+            ReadStored(oStrile, pPixels, nHeldPitch);
+    };
+    moHeld.Write({oStrile.mnNumber, oStrile.moRect}, oPart, pSource, nPitch, Read);
 }
 
 void PageWriter::WriteInPlace(const Strile& oStrile, const support::PixelRect& oPart, const unsigned char* pSource,
@@ -158,12 +138,12 @@ void PageWriter::WriteInPlace(const Strile& oStrile, const support::PixelRect& o
     moReader.Forget();
 }
 
-void PageWriter::Store(const Strile& oStrile, const unsigned char* pPixels, std::size_t nPitch)
+void PageWriter::Store(const support::HeldBlocks::Block& oBlock, const unsigned char* pPixels, std::size_t nPitch)
 {
     const std::span<const unsigned char> oBytes =
-        moEncoder.Encode(pPixels, nPitch, oStrile.moRect.mnWidth, oStrile.moRect.mnHeight, oStrile.mnStoredRows,
-                         ReadForm(oStrile.mnNumber));
-    mpoEditor->StoreStrile(*mpoModel, oStrile.mnNumber, oBytes.data(), oBytes.size());
+        moEncoder.Encode(pPixels, nPitch, oBlock.moRect.mnWidth, oBlock.moRect.mnHeight,
+                         moForm.GetStrileRows(oBlock.moRect.mnY / moForm.mnStrileHeight), ReadForm(oBlock.mnNumber));
+    mpoEditor->StoreStrile(*mpoModel, oBlock.mnNumber, oBytes.data(), oBytes.size());
     moReader.Forget();
 }
 
@@ -195,7 +175,7 @@ void PageWriter::StoreCoded(std::uint64_t nStrile, const unsigned char* pBytes, 
     CheckPage();
     NoteChange();
     mpoEditor->StoreStrile(*mpoModel, nStrile, pBytes, nBytes);
-    Forget(nStrile);
+    moHeld.Forget(nStrile);
     moReader.Forget();
 }
 
@@ -215,44 +195,6 @@ void PageWriter::ReadStored(const Strile& oStrile, unsigned char* pTarget, std::
     }
 }
 
-PageWriter::Held& PageWriter::Hold(const Strile& oStrile)
-{
-    const auto oFound = moIndex.find(oStrile.mnNumber);
-    if (oFound != moIndex.end())
-    {
-        moHeld.splice(moHeld.begin(), moHeld, oFound->second);
-        return moHeld.front();
-    }
-    const std::size_t nPitch = oStrile.moRect.mnWidth * GetPixelBytes();
-    const std::size_t nBytes = nPitch * oStrile.moRect.mnHeight;
-    while (!moHeld.empty() && mnHeldBytes + nBytes > mnBound)
-        StoreOldest();
-    Held oHeld{oStrile, std::vector<unsigned char>(nBytes)};
-    if (mpoModel->Get(oStrile.mnNumber).IsStored())
-        ReadStored(oStrile, oHeld.moPixels.data(), nPitch);
-    moHeld.push_front(std::move(oHeld));
-    moIndex[oStrile.mnNumber] = moHeld.begin();
-    mnHeldBytes += nBytes;
-    return moHeld.front();
-}
-
-void PageWriter::StoreOldest()
-{
-    const Held& oHeld = moHeld.back();
-    Store(oHeld.moStrile, oHeld.moPixels.data(), oHeld.moStrile.moRect.mnWidth * GetPixelBytes());
-    Forget(oHeld.moStrile.mnNumber);
-}
-
-void PageWriter::Forget(std::uint64_t nStrile)
-{
-    const auto oFound = moIndex.find(nStrile);
-    if (oFound == moIndex.end())
-        return;
-    mnHeldBytes -= oFound->second->moPixels.size();
-    moHeld.erase(oFound->second);
-    moIndex.erase(oFound);
-}
-
 // The room of a page that was deleted or replaced may hold something else by now.
 void PageWriter::CheckPage() const
 {
@@ -263,13 +205,8 @@ void PageWriter::CheckPage() const
 void PageWriter::Flush()
 {
     if (mpoModel->mbGone)
-    {
-        moHeld.clear();
-        moIndex.clear();
-        mnHeldBytes = 0;
-    }
-    while (!moHeld.empty())
-        StoreOldest();
+        moHeld.Clear();
+    moHeld.StoreAll();
 }
 
 } // namespace krv::plugins::tif

@@ -1,16 +1,15 @@
 #pragma once
 
 #include "plugins/support/image/iblocksource.h"
+#include "plugins/support/writing/heldblocks.h"
 #include "plugins/tif/reading/strilesource.h"
 #include "plugins/tif/writing/fileeditor.h"
 #include "plugins/tif/writing/strileencoder.h"
 
 #include <cstdint>
 #include <functional>
-#include <list>
 #include <memory>
 #include <optional>
-#include <unordered_map>
 
 namespace krv::plugins::tif
 {
@@ -18,28 +17,28 @@ namespace krv::plugins::tif
 // Reads and writes the pixels of one page of a file that is being written. Strips and tiles that come whole are encoded
 // at once; of others the pixels are held back, bounded in bytes, until they have to make room or the file is
 // synchronised. One thread at a time.
-class PageWriter
+class PageWriter : public support::IBlockSource
 {
 public:
     PageWriter(std::shared_ptr<FileEditor> poEditor, std::shared_ptr<PageModel> poModel, std::shared_ptr<Page> poPage,
                PixelUse eUse);
-    ~PageWriter();
+    ~PageWriter() override;
     PageWriter(const PageWriter&) = delete;
     PageWriter& operator=(const PageWriter&) = delete;
 
-    const support::ImageLayout& GetLayout() const { return moReader.GetLayout(); }
-    bool ReadsParts() const { return moReader.ReadsParts(); }
-    bool SparesParts() const { return moReader.SparesParts(); }
-    std::string GetName() const { return mpoEditor->GetFileName(); }
+    const support::ImageLayout& GetLayout() const override { return moReader.GetLayout(); }
+    bool ReadsParts() const override { return moReader.ReadsParts(); }
+    bool SparesParts() const override { return moReader.SparesParts(); }
+    std::string GetName() const override { return mpoEditor->GetFileName(); }
     PageModel& GetModel() { return *mpoModel; }
 
-    void Read(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
-              std::size_t nPitch);
-    void Write(const support::BlockAddress& oBlock, const support::PixelRect& oPart, const unsigned char* pSource,
-               std::size_t nPitch);
+    void ReadBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
+                   std::size_t nPitch) override;
+    void WriteBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, const unsigned char* pSource,
+                    std::size_t nPitch) override;
     // Takes the bytes of a strip or tile as they are.
     void StoreCoded(std::uint64_t nStrile, const unsigned char* pBytes, std::size_t nBytes);
-    bool Holds() const { return !moHeld.empty(); }
+    bool Holds() const { return !moHeld.IsEmpty(); }
     // Stores what is held back, as long as the page is there.
     void Flush();
 
@@ -56,12 +55,6 @@ private:
         std::uint32_t mnStoredRows;
     };
 
-    struct Held
-    {
-        Strile moStrile;
-        std::vector<unsigned char> moPixels; // of the part in the image
-    };
-
     template <typename Action>
     void ForEach(unsigned int nPlane, const support::PixelRect& oRect, Action oAction) const;
     support::PixelRect ToImage(const support::BlockAddress& oBlock, const support::PixelRect& oPart) const;
@@ -70,12 +63,9 @@ private:
                    std::size_t nPitch);
     void WriteInPlace(const Strile& oStrile, const support::PixelRect& oPart, const unsigned char* pSource,
                       std::size_t nPitch);
-    void Store(const Strile& oStrile, const unsigned char* pPixels, std::size_t nPitch);
-    Held& Hold(const Strile& oStrile);
+    void Store(const support::HeldBlocks::Block& oBlock, const unsigned char* pPixels, std::size_t nPitch);
     std::span<const unsigned char> ReadForm(std::uint64_t nStrile);
     void ReadStored(const Strile& oStrile, unsigned char* pTarget, std::size_t nPitch);
-    void StoreOldest();
-    void Forget(std::uint64_t nStrile);
     void CheckPage() const;
     std::size_t GetPixelBytes() const { return GetLayout().GetPixelBytes(0); }
 
@@ -87,38 +77,8 @@ private:
     StrileEncoder moEncoder;
     std::vector<unsigned char> moLike; // the begin of a strip or tile that others take their form of
     std::uint64_t mnLike = UINT64_MAX;
-    std::size_t mnBound;
-    std::size_t mnHeldBytes = 0;
-    std::list<Held> moHeld; // the one used last first
-    std::unordered_map<std::uint64_t, std::list<Held>::iterator> moIndex;
+    support::HeldBlocks moHeld;
     std::function<void()> moOnChange;
-};
-
-// A page that is being written as the source of a block image.
-class EditedSource : public support::IBlockSource
-{
-public:
-    explicit EditedSource(std::shared_ptr<PageWriter> poWriter) : mpoWriter(std::move(poWriter)) {}
-    ~EditedSource() override;
-
-    const support::ImageLayout& GetLayout() const override { return mpoWriter->GetLayout(); }
-    void ReadBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
-                   std::size_t nPitch) override
-    {
-        mpoWriter->Read(oBlock, oPart, pTarget, nPitch);
-    }
-    bool ReadsParts() const override { return mpoWriter->ReadsParts(); }
-    bool SparesParts() const override { return mpoWriter->SparesParts(); }
-    void WriteBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, const unsigned char* pSource,
-                    std::size_t nPitch) override
-    {
-        mpoWriter->Write(oBlock, oPart, pSource, nPitch);
-    }
-    std::string GetName() const override { return mpoWriter->GetName(); }
-    const std::shared_ptr<PageWriter>& GetWriter() const { return mpoWriter; }
-
-private:
-    std::shared_ptr<PageWriter> mpoWriter;
 };
 
 } // namespace krv::plugins::tif

@@ -2,9 +2,8 @@
 
 #include "plugins/support/codec/bits.h"
 #include "plugins/support/codec/interleave.h"
-#include "plugins/support/codec/lzwdecoder.h"
 #include "plugins/support/codec/predictor.h"
-#include "plugins/tif/writing/createoptions.h"
+#include "plugins/tif/reading/compression.h"
 #include "plugins/tif/writing/librarycodec.h"
 #include "toolkit/exceptions/exceptions.h"
 
@@ -23,22 +22,6 @@ namespace
 constexpr bool BIG_ENDIAN_MACHINE = std::endian::native == std::endian::big;
 constexpr unsigned int MOST_PACKED_BITS = 32;
 
-bool IsDeflate(std::uint16_t nCompression)
-{
-    return nCompression == COMPRESSION_DEFLATE || nCompression == COMPRESSION_ADOBE_DEFLATE;
-}
-
-bool IsOwnCodec(std::uint16_t nCompression)
-{
-    return IsDeflate(nCompression) || nCompression == COMPRESSION_LZW || nCompression == COMPRESSION_ZSTD;
-}
-
-// Codecs of libtiff that need nothing but the tags of the page.
-bool IsLibraryCodec(std::uint16_t nCompression)
-{
-    return nCompression == COMPRESSION_PACKBITS || nCompression == COMPRESSION_LZMA;
-}
-
 std::int64_t ReadSample(const unsigned char* pSample, std::size_t nBytes, bool bSigned)
 {
     std::uint64_t nValue = 0;
@@ -53,25 +36,15 @@ std::int64_t ReadSample(const unsigned char* pSample, std::size_t nBytes, bool b
 StrileEncoder::StrileEncoder(Page& oPage, PixelUse eUse, std::optional<int> oLevel)
     : moPage(oPage), moForm(oPage.GetForm()), meUse(eUse), moLevel(oLevel)
 {
-    const std::uint16_t nCompression = moForm.mnCompression;
-    if (IsDeflate(nCompression))
-        mpoDeflate = std::make_unique<codec::DeflateEncoder>(moLevel.value_or(codec::DeflateEncoder::DEFAULT_LEVEL));
-    else if (nCompression == COMPRESSION_ZSTD)
-        mpoZstd = std::make_unique<codec::ZstdEncoder>(moLevel.value_or(codec::ZstdEncoder::DEFAULT_LEVEL));
-    else if (nCompression == COMPRESSION_LZW)
-        mpoLzw = std::make_unique<codec::LzwEncoder>();
-    else if (nCompression == COMPRESSION_JPEG)
+    const Compression* const pCompression = FindCompression(moForm.mnCompression);
+    if (moForm.mnCompression == COMPRESSION_JPEG)
         mpoJpeg = std::make_unique<JpegEncoder>(oPage, oLevel);
+    else if (pCompression != nullptr && pCompression->mpCodec != nullptr &&
+             pCompression->mpCodec->mpMakeEncoder != nullptr)
+        mpoEncoder = pCompression->mpCodec->mpMakeEncoder(oLevel);
 }
 
 StrileEncoder::~StrileEncoder() = default;
-
-bool StrileEncoder::CanEncode(std::uint16_t nCompression)
-{
-    return nCompression == COMPRESSION_NONE || IsOwnCodec(nCompression) ||
-           ((IsLibraryCodec(nCompression) || nCompression == COMPRESSION_JPEG) &&
-            TIFFIsCODECConfigured(nCompression) != 0);
-}
 
 std::string StrileEncoder::FindObstacle() const
 {
@@ -188,7 +161,7 @@ StrileEncoder::Rows StrileEncoder::Order(const Rows& oRows, std::uint32_t nStore
     const SampleForm& oSample = moForm.moSample;
     const std::size_t nPitch = moForm.GetStoredRowBytes(moForm.mnStrileWidth);
     const bool bSwapped = moForm.mbBigEndian != BIG_ENDIAN_MACHINE;
-    const bool bLibrary = moForm.mnCompression != COMPRESSION_NONE && !IsOwnCodec(moForm.mnCompression);
+    const bool bLibrary = moForm.mnCompression != COMPRESSION_NONE && !mpoEncoder;
     if (!bLibrary && moForm.mnPredictor != PREDICTOR_NONE)
     {
         const codec::BlockShape oShape{moForm.mnStrileWidth, nStoredRows, moForm.GetPlaneChannels(),
@@ -221,18 +194,12 @@ std::span<const unsigned char> StrileEncoder::Compress(const unsigned char* pSto
         return {pStored, nBytes};
     if (mpoJpeg)
         return mpoJpeg->Encode(pStored, nStoredRows, oLike);
-    if (mpoLzw)
+    if (mpoEncoder)
     {
-        const bool bOld = codec::LzwDecoder::IsOldStyle(oLike.data(), oLike.size());
-        unsigned char* pCoded = moCoded.Get(codec::LzwEncoder::GetBound(nBytes));
-        return {pCoded, mpoLzw->Encode(pStored, nBytes, pCoded, bOld)};
-    }
-    if (mpoDeflate || mpoZstd)
-    {
-        const std::size_t nBound = mpoDeflate ? mpoDeflate->GetBound(nBytes) : mpoZstd->GetBound(nBytes);
+        const std::size_t nBound = mpoEncoder->GetBound(nBytes);
         unsigned char* pCoded = moCoded.Get(nBound);
-        return {pCoded, mpoDeflate ? mpoDeflate->Encode(pStored, nBytes, pCoded, nBound)
-                                   : mpoZstd->Encode(pStored, nBytes, pCoded, nBound)};
+        mpoEncoder->TakeForm(oLike);
+        return {pCoded, mpoEncoder->Encode(pStored, nBytes, pCoded, nBound)};
     }
     moLibraryBytes = EncodeByLibrary(moForm, moLevel, pStored, nBytes, nStoredRows, moPage.GetFileName());
     return moLibraryBytes;

@@ -1,9 +1,7 @@
 #pragma once
 
-#include "plugins/support/codec/deflateencoder.h"
-#include "plugins/support/codec/lzwencoder.h"
-#include "plugins/support/codec/zstdencoder.h"
-#include "plugins/support/image/scratch.h"
+#include "plugins/support/codec/blockcodec.h"
+#include "plugins/support/file/scratch.h"
 #include "plugins/tif/reading/page.h"
 #include "plugins/tif/reading/strilesource.h"
 #include "plugins/tif/writing/jpegencoder.h"
@@ -29,9 +27,6 @@ public:
     StrileEncoder(Page& oPage, PixelUse eUse, std::optional<int> oLevel);
     ~StrileEncoder();
 
-    // Whether there is an encoder for a compression.
-    static bool CanEncode(std::uint16_t nCompression);
-
     // Throws DataException for a page whose pixels cannot be written.
     void CheckWritable(const Place& oPlace = Place::Current()) const;
 
@@ -39,7 +34,10 @@ public:
     bool IsPlain() const;
 
     // How many bytes of what is stored tell Encode the form of the page's strips or tiles.
-    std::size_t GetFormBytes() const { return mpoJpeg ? JpegEncoder::FORM_BYTES : mpoLzw ? 2 : 0; }
+    std::size_t GetFormBytes() const
+    {
+        return mpoJpeg ? JpegEncoder::FORM_BYTES : mpoEncoder ? mpoEncoder->GetFormBytes() : 0;
+    }
 
     // nWidth, nRows: what of the strip or tile lies in the image. nStoredRows: the rows that it stores. oLike: so many
     // of the bytes that are replaced, or of others of the page. The result is valid until the next call; it may be the
@@ -67,9 +65,7 @@ private:
     const PageForm& moForm;
     PixelUse meUse;
     std::optional<int> moLevel;
-    std::unique_ptr<codec::DeflateEncoder> mpoDeflate;
-    std::unique_ptr<codec::ZstdEncoder> mpoZstd;
-    std::unique_ptr<codec::LzwEncoder> mpoLzw;
+    std::unique_ptr<codec::BlockEncoder> mpoEncoder; // one of two, or none when libtiff encodes
     std::unique_ptr<JpegEncoder> mpoJpeg;
     support::Scratch moNarrow;
     support::Scratch moPadded;

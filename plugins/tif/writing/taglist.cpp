@@ -9,12 +9,6 @@
 namespace krv::plugins::tif
 {
 
-void AppendNumber(std::vector<unsigned char>& oBytes, std::uint64_t nValue, std::size_t nBytes, bool bBigEndian)
-{
-    for (std::size_t nAt = 0; nAt < nBytes; ++nAt)
-        oBytes.push_back(static_cast<unsigned char>(nValue >> 8 * (bBigEndian ? nBytes - 1 - nAt : nAt)));
-}
-
 std::vector<Tag>& TagList::EditTags()
 {
     if (mpoTags.use_count() > 1)

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "plugins/support/file/file.h"
+#include "plugins/support/file/numbers.h"
 #include "plugins/support/file/space.h"
 #include "plugins/tif/reading/rawdirectory.h"
 
@@ -11,6 +12,8 @@
 
 namespace krv::plugins::tif
 {
+
+using support::AppendNumber;
 
 using support::Extent;
 
@@ -69,8 +72,5 @@ private:
     std::shared_ptr<std::vector<Tag>> mpoTags = std::make_shared<std::vector<Tag>>();
     std::vector<Extent> moReleased;
 };
-
-// Appends a whole number of 1 to 8 bytes in the order of a file.
-void AppendNumber(std::vector<unsigned char>& oBytes, std::uint64_t nValue, std::size_t nBytes, bool bBigEndian);
 
 } // namespace krv::plugins::tif

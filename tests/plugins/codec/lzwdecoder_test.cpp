@@ -1,6 +1,5 @@
-#include "plugins/support/codec/lzwdecoder.h"
+#include "plugins/support/codec/lzw.h"
 
-#include "plugins/support/codec/lzwencoder.h"
 #include "tests/plugins/codec/blocks.h"
 
 #include <gtest/gtest.h>
@@ -44,8 +43,12 @@ struct Textbook
 
 Bytes Encode(const Bytes& oData, bool bOld)
 {
-    Bytes oCoded(krv::plugins::codec::LzwEncoder::GetBound(oData.size()));
-    oCoded.resize(krv::plugins::codec::LzwEncoder().Encode(oData.data(), oData.size(), oCoded.data(), bOld));
+    constexpr unsigned char FIRST_EDITION[] = {0, 1};
+    krv::plugins::codec::LzwEncoder oEncoder;
+    Bytes oCoded(oEncoder.GetBound(oData.size()));
+    if (bOld)
+        oEncoder.TakeForm(FIRST_EDITION);
+    oCoded.resize(oEncoder.Encode(oData.data(), oData.size(), oCoded.data(), oCoded.size()));
     return oCoded;
 }
 

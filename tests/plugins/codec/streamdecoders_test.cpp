@@ -1,6 +1,6 @@
 // Deflate and zstandard keep the same promises about streams that end early, late or never.
-#include "plugins/support/codec/deflatedecoder.h"
-#include "plugins/support/codec/zstddecoder.h"
+#include "plugins/support/codec/deflate.h"
+#include "plugins/support/codec/zstd.h"
 #include "tests/plugins/codec/blocks.h"
 
 #include <gtest/gtest.h>

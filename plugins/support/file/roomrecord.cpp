@@ -1,19 +1,18 @@
-#include "plugins/tif/writing/roomrecord.h"
+#include "plugins/support/file/roomrecord.h"
 
-#include "plugins/tif/reading/rawdirectory.h"
-#include "plugins/tif/writing/taglist.h"
+#include "plugins/support/file/numbers.h"
 
 #include <algorithm>
 #include <cstring>
 #include <string_view>
 
-namespace krv::plugins::tif
+namespace krv::plugins::support
 {
 
 namespace
 {
 
-// Then numbers of 8 bytes, little-endian: the place of the directory, the size of the file, the number of parts, place
+// Then numbers of 8 bytes, little-endian: the place of the root, the size of the file, the number of parts, place
 // and size of each; and the check of all of them.
 constexpr std::string_view MAGIC("KRV\r\nROOM\x1A\0\0\0\0\0\1", 16);
 constexpr std::size_t WORD = 8;
@@ -35,19 +34,19 @@ std::size_t RoomRecord::GetBytes(std::size_t nForeign)
     return MAGIC.size() + (FIXED_WORDS + 2 * nForeign + 1) * WORD;
 }
 
-std::vector<unsigned char> RoomRecord::Make(std::uint64_t nDirectory) const
+std::vector<unsigned char> RoomRecord::Make(std::uint64_t nRoot) const
 {
     std::vector<unsigned char> oBytes(MAGIC.begin(), MAGIC.end());
-    for (const std::uint64_t nValue : {nDirectory, mnFileBytes, std::uint64_t{moForeign.size()}})
+    for (const std::uint64_t nValue : {nRoot, mnFileBytes, std::uint64_t{moForeign.size()}})
         AppendNumber(oBytes, nValue, WORD, false);
-    for (const support::Extent& oPart : moForeign)
+    for (const Extent& oPart : moForeign)
         for (const std::uint64_t nValue : {oPart.mnOffset, oPart.mnBytes})
             AppendNumber(oBytes, nValue, WORD, false);
     AppendNumber(oBytes, Check(oBytes.data(), oBytes.size()), WORD, false);
     return oBytes;
 }
 
-std::optional<RoomRecord> RoomRecord::Read(const support::File& oFile, std::uint64_t nDirectory, std::uint64_t nEnd)
+std::optional<RoomRecord> RoomRecord::Read(const File& oFile, std::uint64_t nRoot, std::uint64_t nEnd)
 {
     std::vector<unsigned char> oBytes(GetBytes(MAXIMUM_FOREIGN));
     oBytes.resize(oFile.ReadUpTo(nEnd, oBytes.data(), oBytes.size()));
@@ -58,7 +57,7 @@ std::optional<RoomRecord> RoomRecord::Read(const support::File& oFile, std::uint
     if (oBytes.size() < GetBytes(0) || std::memcmp(oBytes.data(), MAGIC.data(), MAGIC.size()) != 0)
         return std::nullopt;
     const std::uint64_t nForeign = Word(2);
-    if (nForeign > MAXIMUM_FOREIGN || oBytes.size() < GetBytes(nForeign) || Word(0) != nDirectory ||
+    if (nForeign > MAXIMUM_FOREIGN || oBytes.size() < GetBytes(nForeign) || Word(0) != nRoot ||
         Word(FIXED_WORDS + 2 * nForeign) != Check(oBytes.data(), GetBytes(nForeign) - WORD) ||
         Word(1) > oFile.GetSize() || Word(1) < nEnd + GetBytes(nForeign))
         return std::nullopt;
@@ -67,7 +66,7 @@ std::optional<RoomRecord> RoomRecord::Read(const support::File& oFile, std::uint
     std::uint64_t nBefore = 0;
     for (std::size_t nAt = 0; nAt < nForeign; ++nAt)
     {
-        const support::Extent oPart{Word(FIXED_WORDS + 2 * nAt), Word(FIXED_WORDS + 2 * nAt + 1), 0};
+        const Extent oPart{Word(FIXED_WORDS + 2 * nAt), Word(FIXED_WORDS + 2 * nAt + 1), 0};
         if (oPart.mnOffset < nBefore || oPart.mnBytes > oRecord.mnFileBytes ||
             oPart.mnOffset > oRecord.mnFileBytes - oPart.mnBytes)
             return std::nullopt;
@@ -75,6 +74,21 @@ std::optional<RoomRecord> RoomRecord::Read(const support::File& oFile, std::uint
         oRecord.moForeign.push_back(oPart);
     }
     return oRecord;
+}
+
+bool RoomRecord::SharesOwn(const std::vector<Extent>& oPieces) const
+{
+    std::uint64_t nEnd = 0;
+    for (const Extent& oPiece : oPieces)
+    {
+        if (oPiece.mnOffset < nEnd &&
+            std::none_of(moForeign.begin(), moForeign.end(),
+                         [&](const Extent& oPart)
+                         { return oPart.mnOffset <= oPiece.mnOffset && nEnd <= oPart.GetEnd(); }))
+            return true;
+        nEnd = std::max(nEnd, oPiece.GetEnd());
+    }
+    return false;
 }
 
 void RoomRecord::AddForeign(std::uint64_t nOffset, std::uint64_t nBytes)
@@ -90,4 +104,4 @@ void RoomRecord::AddForeign(std::uint64_t nOffset, std::uint64_t nBytes)
     moForeign.push_back({nOffset, nBytes, 0});
 }
 
-} // namespace krv::plugins::tif
+} // namespace krv::plugins::support

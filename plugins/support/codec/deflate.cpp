@@ -1,4 +1,4 @@
-#include "plugins/support/codec/deflatedecoder.h"
+#include "plugins/support/codec/deflate.h"
 
 #include <libdeflate.h>
 #include <zlib.h>
@@ -6,19 +6,10 @@
 #include <algorithm>
 #include <array>
 #include <limits>
+#include <new>
 
 namespace krv::plugins::codec
 {
-
-struct DeflateDecoder::State
-{
-    libdeflate_decompressor* mpoDecompressor = libdeflate_alloc_decompressor();
-
-    State() = default;
-    State(const State&) = delete;
-    State& operator=(const State&) = delete;
-    ~State() { libdeflate_free_decompressor(mpoDecompressor); }
-};
 
 namespace
 {
@@ -94,25 +85,34 @@ Result Inflate(const unsigned char* input, std::size_t nInput, unsigned char* ou
 
 } // namespace
 
-DeflateDecoder::DeflateDecoder() = default;
-DeflateDecoder::~DeflateDecoder() = default;
-DeflateDecoder::DeflateDecoder(DeflateDecoder&&) noexcept = default;
-DeflateDecoder& DeflateDecoder::operator=(DeflateDecoder&&) noexcept = default;
-
 Result DeflateDecoder::Decode(const unsigned char* input, std::size_t nInput, unsigned char* output,
                               std::size_t nOutput)
 {
-    if (!mpoState)
-        mpoState = std::make_unique<State>();
-    if (mpoState->mpoDecompressor != nullptr)
-    {
-        std::size_t nBytes = 0;
-        const libdeflate_result oResult =
-            libdeflate_zlib_decompress(mpoState->mpoDecompressor, input, nInput, output, nOutput, &nBytes);
-        if (oResult == LIBDEFLATE_SUCCESS)
-            return {nBytes == nOutput ? Status::eDone : Status::eTruncated, nBytes};
-    }
+    if (!mpoDecompressor)
+        mpoDecompressor = {libdeflate_alloc_decompressor(), &libdeflate_free_decompressor};
+    std::size_t nBytes = 0;
+    if (mpoDecompressor && libdeflate_zlib_decompress(mpoDecompressor.get(), input, nInput, output, nOutput, &nBytes) ==
+                               LIBDEFLATE_SUCCESS)
+        return {nBytes == nOutput ? Status::eDone : Status::eTruncated, nBytes};
     return Inflate(input, nInput, output, nOutput);
+}
+
+DeflateEncoder::DeflateEncoder(int nLevel)
+    : mpoCompressor(libdeflate_alloc_compressor(std::clamp(nLevel, 1, MAXIMUM_LEVEL)), &libdeflate_free_compressor)
+{
+    if (!mpoCompressor)
+        throw std::bad_alloc();
+}
+
+std::size_t DeflateEncoder::GetBound(std::size_t nInput) const
+{
+    return libdeflate_zlib_compress_bound(mpoCompressor.get(), nInput);
+}
+
+std::size_t DeflateEncoder::Encode(const unsigned char* input, std::size_t nInput, unsigned char* output,
+                                   std::size_t nOutput)
+{
+    return libdeflate_zlib_compress(mpoCompressor.get(), input, nInput, output, nOutput);
 }
 
 } // namespace krv::plugins::codec

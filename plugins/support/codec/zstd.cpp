@@ -1,22 +1,14 @@
-#include "plugins/support/codec/zstddecoder.h"
+#include "plugins/support/codec/zstd.h"
 
 #include <zstd.h>
 #include <zstd_errors.h>
 
+#include <algorithm>
 #include <array>
+#include <new>
 
 namespace krv::plugins::codec
 {
-
-struct ZstdDecoder::State
-{
-    ZSTD_DCtx* mpoContext = ZSTD_createDCtx();
-
-    State() = default;
-    State(const State&) = delete;
-    State& operator=(const State&) = delete;
-    ~State() { ZSTD_freeDCtx(mpoContext); }
-};
 
 namespace
 {
@@ -58,16 +50,14 @@ Result DecodeStream(ZSTD_DCtx* context, const unsigned char* input, std::size_t 
 
 } // namespace
 
-ZstdDecoder::ZstdDecoder() = default;
-ZstdDecoder::~ZstdDecoder() = default;
-ZstdDecoder::ZstdDecoder(ZstdDecoder&&) noexcept = default;
-ZstdDecoder& ZstdDecoder::operator=(ZstdDecoder&&) noexcept = default;
-
 Result ZstdDecoder::Decode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput)
 {
-    if (!mpoState)
-        mpoState = std::make_unique<State>();
-    ZSTD_DCtx* context = mpoState->mpoContext;
+    if (!mpoContext)
+        mpoContext = {ZSTD_createDCtx(), [](ZSTD_DCtx* context)
+                      {
+                          ZSTD_freeDCtx(context);
+                      }};
+    ZSTD_DCtx* const context = mpoContext.get();
     if (context == nullptr)
         return {Status::eNoMemory, 0};
     const std::size_t nFrame = ZSTD_findFrameCompressedSize(input, nInput);
@@ -78,6 +68,27 @@ Result ZstdDecoder::Decode(const unsigned char* input, std::size_t nInput, unsig
             return {Status::eDone, nBytes};
     }
     return DecodeStream(context, input, nInput, output, nOutput);
+}
+
+ZstdEncoder::ZstdEncoder(int nLevel) : mpoContext(ZSTD_createCCtx(), [](ZSTD_CCtx* context) { ZSTD_freeCCtx(context); })
+{
+    if (!mpoContext)
+        throw std::bad_alloc();
+    ZSTD_CCtx_setParameter(mpoContext.get(), ZSTD_c_compressionLevel, std::clamp(nLevel, 1, MAXIMUM_LEVEL));
+}
+
+std::size_t ZstdEncoder::GetBound(std::size_t nInput) const
+{
+    return ZSTD_compressBound(nInput);
+}
+
+std::size_t ZstdEncoder::Encode(const unsigned char* input, std::size_t nInput, unsigned char* output,
+                                std::size_t nOutput)
+{
+    const std::size_t nBytes = ZSTD_compress2(mpoContext.get(), output, nOutput, input, nInput);
+    if (ZSTD_isError(nBytes))
+        throw std::bad_alloc();
+    return nBytes;
 }
 
 } // namespace krv::plugins::codec

@@ -1,0 +1,85 @@
+#include "datasources/metadata/levelbook.h"
+
+#include "datasources/metadata/auxiliarydata.h"
+
+#include <algorithm>
+#include <cctype>
+#include <iterator>
+#include <string_view>
+
+namespace krv::datasources
+{
+
+namespace
+{
+
+const std::string VALID = "valid";
+const std::string INVALID = "invalid";
+// In which other programs say how they made the levels.
+const std::string FOREIGN_METHOD_KEY = "IMAGE_STRUCTURE:OVERVIEW_RESAMPLING";
+
+std::string GetKey(unsigned int nLevel)
+{
+    return "_Overview_" + std::to_string(nLevel);
+}
+
+} // namespace
+
+bool IsLevelValid(const AuxiliaryData& oBook, unsigned int nChannel, unsigned int nLevel)
+{
+    return !oBook.GetChanMetadataValue(GetKey(nLevel), nChannel).starts_with(INVALID);
+}
+
+void SetLevelValid(AuxiliaryData& oBook, unsigned int nChannel, unsigned int nLevel, bool bValid,
+                   const std::string& method)
+{
+    const std::string suffix = method.empty() ? std::string() : " " + method;
+    oBook.SetChanMetadataValue(GetKey(nLevel), (bValid ? VALID : INVALID) + suffix, nChannel);
+    if (!method.empty() && !oBook.GetFileMetadataValue(FOREIGN_METHOD_KEY).empty())
+        oBook.SetFileMetadataValue(FOREIGN_METHOD_KEY, method);
+}
+
+bool SetLevelInvalid(AuxiliaryData& oBook, unsigned int nLevel)
+{
+    bool bNews = false;
+    for (unsigned int nChannel = 1; nChannel <= oBook.GetChannelCount(); ++nChannel)
+    {
+        bNews = bNews || oBook.GetChanMetadataValue(GetKey(nLevel), nChannel) != INVALID;
+        SetLevelValid(oBook, nChannel, nLevel, false, {});
+    }
+    return bNews;
+}
+
+void RemoveLevel(AuxiliaryData& oBook, unsigned int nLevel)
+{
+    for (unsigned int nChannel = 1; nChannel <= oBook.GetChannelCount(); ++nChannel)
+        oBook.RemoveChanMetadataValue(GetKey(nLevel), nChannel);
+}
+
+void CopyLevel(const AuxiliaryData& oFrom, AuxiliaryData& oTo, unsigned int nLevel)
+{
+    const std::string key = GetKey(nLevel);
+    const unsigned int nChannels = std::min(oFrom.GetChannelCount(), oTo.GetChannelCount());
+    for (unsigned int nChannel = 1; nChannel <= nChannels; ++nChannel)
+        oTo.SetChanMetadataValue(key, oFrom.GetChanMetadataValue(key, nChannel), nChannel);
+}
+
+std::string GetLevelMethod(const AuxiliaryData& oBook, unsigned int nLevel)
+{
+    const std::string state = oBook.GetChanMetadataValue(GetKey(nLevel), 1);
+    const std::size_t nBlank = state.find(' ');
+    return nBlank != std::string::npos ? state.substr(nBlank + 1)
+                                       : ParseLevelMethod(oBook.GetFileMetadataValue(FOREIGN_METHOD_KEY));
+}
+
+std::string ParseLevelMethod(const std::string& name)
+{
+    constexpr std::string_view NAMES[] = {"NEAREST", "AVERAGE", "MODE", "BILINEAR", "CUBIC",
+                                          "LANCZOS", "RMS",     "MIN",  "MAX",      "NONE"};
+    std::string upper = name;
+    std::transform(upper.begin(), upper.end(), upper.begin(), [](unsigned char n) { return std::toupper(n); });
+    const bool bKnown = std::find(std::begin(NAMES), std::end(NAMES), upper) != std::end(NAMES);
+    return bKnown ? upper : std::string();
+}
+
+} // namespace krv::datasources

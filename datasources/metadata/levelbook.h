@@ -1,0 +1,33 @@
+#pragma once
+
+#include "datasources/api.h"
+
+#include <string>
+#include <vector>
+
+namespace krv::datasources
+{
+
+class AuxiliaryData;
+
+// The book of levels: what a file's record says of its overviews. A channel's tag "_Overview_<level>" says "valid" or
+// "invalid", and behind a blank the method by which the level was made. A level without the tag counts as valid: other
+// programs made it, whose method for all levels the file's tag "IMAGE_STRUCTURE:OVERVIEW_RESAMPLING" may tell.
+// Channels count from 1.
+
+KRV_DATASOURCES_API bool IsLevelValid(const AuxiliaryData& oBook, unsigned int nChannel, unsigned int nLevel);
+// method: in capitals; empty when it is not known.
+KRV_DATASOURCES_API void SetLevelValid(AuxiliaryData& oBook, unsigned int nChannel, unsigned int nLevel, bool bValid,
+                                       const std::string& method);
+// Of no channel, by no method. Returns whether that is news.
+KRV_DATASOURCES_API bool SetLevelInvalid(AuxiliaryData& oBook, unsigned int nLevel);
+KRV_DATASOURCES_API void RemoveLevel(AuxiliaryData& oBook, unsigned int nLevel);
+// Puts what a book says of a level in the place of what another one does, for the channels that both have.
+KRV_DATASOURCES_API void CopyLevel(const AuxiliaryData& oFrom, AuxiliaryData& oTo, unsigned int nLevel);
+// In capitals; empty when it is not known.
+KRV_DATASOURCES_API std::string GetLevelMethod(const AuxiliaryData& oBook, unsigned int nLevel);
+
+// The name of a method in capitals, given in any letter case; empty for one that overview managers do not know.
+KRV_DATASOURCES_API std::string ParseLevelMethod(const std::string& name);
+
+} // namespace krv::datasources

@@ -1,0 +1,119 @@
+#include "plugins/support/recorddataset.h"
+
+#include "datasources/metadata/levelbook.h"
+
+#include <utility>
+
+namespace krv::plugins::support
+{
+
+void RecordDataset::ShowRecord(RecordText oRecord)
+{
+    moRecord = std::move(oRecord);
+    moGeocoding = moRecord.GetGeocoding();
+}
+
+void RecordDataset::Change(RecordText oRecord) const
+{
+    StoreRecord(oRecord);
+    moRecord = std::move(oRecord);
+}
+
+krv::datasources::AuxiliaryData RecordDataset::ReadAuxiliaryData()
+{
+    GetImage();
+    return moRecord.moTags;
+}
+
+void RecordDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData)
+{
+    CheckWriting("metadata cannot be written", Place::Current());
+    if (oData.GetChannelCount() != GetChanCount())
+        Refuse("the metadata are those of " + std::to_string(oData.GetChannelCount()) + " channels, not of " +
+               std::to_string(GetChanCount()));
+    RecordText oRecord = moRecord;
+    oRecord.moTags = oData;
+    for (const auto& [nLevel, nPlace] : moRecord.moLevels)
+        CopyLevel(moRecord.moTags, oRecord.moTags, nLevel);
+    Change(std::move(oRecord));
+}
+
+krv::ogc::cs::ICRS* RecordDataset::ReadCRS() const
+{
+    return moRecord.GetCRS().release();
+}
+
+void RecordDataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
+{
+    CheckWriting("the reference system cannot be written", Place::Current());
+    RecordText oRecord = moRecord;
+    oRecord.SetCRS(oCRS);
+    Change(std::move(oRecord));
+}
+
+void RecordDataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
+{
+    CheckWriting("the geocoding cannot be written", Place::Current());
+    if (!oInfo.IsInvertible())
+        Refuse("a geocoding without an inverse cannot be written");
+    RecordText oRecord = moRecord;
+    oRecord.SetGeocoding(oInfo);
+    Change(std::move(oRecord));
+    moGeocoding = oInfo;
+}
+
+krv::datasources::IOverviewManager* RecordDataset::GetOverviewManager()
+{
+    GetImage();
+    return new OverviewManager(*this, *this);
+}
+
+void RecordDataset::ForgetLevels()
+{
+    bool bNews = false;
+    for (const auto& [nLevel, nPlace] : moRecord.moLevels)
+        bNews = krv::datasources::SetLevelInvalid(moRecord.moTags, nLevel) || bNews;
+    if (bNews)
+        StoreRecord(moRecord);
+}
+
+std::vector<LevelStore::Level> RecordDataset::GetLevels() const
+{
+    std::vector<Level> oLevels;
+    for (const auto& [nLevel, nPlace] : moRecord.moLevels)
+        oLevels.push_back({nLevel, (GetWidth() - 1) / nLevel + 1, (GetHeight() - 1) / nLevel + 1});
+    return oLevels;
+}
+
+std::shared_ptr<BlockImage> RecordDataset::OpenLevel(unsigned int nLevel)
+{
+    std::shared_ptr<BlockImage>& poImage = moOpened[nLevel];
+    if (!poImage)
+        poImage = std::make_shared<BlockImage>(MakeLevelSource(nLevel, moRecord.moLevels.at(nLevel)), GetCache());
+    return poImage;
+}
+
+void RecordDataset::MakeLevel(const Level& oLevel, const krv::datasources::AuxiliaryData& oBook, const Place&)
+{
+    RecordText oRecord = moRecord;
+    oRecord.moTags = oBook;
+    oRecord.moLevels[oLevel.mnNumber] = MakeRoom(oLevel.mnNumber);
+    Change(std::move(oRecord));
+}
+
+void RecordDataset::DropLevel(unsigned int nLevel, const krv::datasources::AuxiliaryData& oBook, const Place& oPlace)
+{
+    WriteBook(oBook, false, oPlace);
+    moRecord.moLevels.erase(nLevel);
+    moOpened.erase(nLevel);
+    StoreRecord(moRecord);
+}
+
+void RecordDataset::WriteBook(const krv::datasources::AuxiliaryData& oBook, bool, const Place&)
+{
+    RecordText oRecord = moRecord;
+    oRecord.moTags = oBook;
+    Change(std::move(oRecord));
+}
+
+} // namespace krv::plugins::support

@@ -1,0 +1,57 @@
+#pragma once
+
+#include "datasources/interfaces/igeocodeddataset.h"
+#include "plugins/support/dataset.h"
+#include "plugins/support/overviewmanager.h"
+#include "plugins/support/writing/recordtext.h"
+
+#include <map>
+
+namespace krv::plugins::support
+{
+
+// A dataset whose metadata, reference system, geocoding and directory of levels are one text: a format says where that
+// text is kept and where the pixels are. Levels can be made as long as the file is written.
+class RecordDataset : public Dataset, public krv::datasources::IGeocodedDataset, private LevelStore
+{
+public:
+    krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
+    // Which levels are valid is not taken from the record: their manager keeps that.
+    void WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override;
+    krv::ogc::cs::ICRS* ReadCRS() const override;
+    void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;
+    const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override { return moGeocoding; }
+    void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) override;
+    krv::datasources::IOverviewManager* GetOverviewManager() override;
+
+protected:
+    using Dataset::Dataset;
+
+    // What the file says when it is opened, or an empty one of so many channels as it has.
+    void ShowRecord(RecordText oRecord);
+    // For the format to call before pixels of the image change: makes the levels outdated.
+    void ForgetLevels();
+
+    // Makes a record the file's. Throws DataException when that cannot be, and changes nothing.
+    virtual void StoreRecord(const RecordText& oRecord) const = 0;
+    // Room for a level that is not there, by the number that will find it.
+    virtual std::uint64_t MakeRoom(unsigned int nLevel) = 0;
+    // The pixels of a level.
+    virtual std::unique_ptr<IBlockSource> MakeLevelSource(unsigned int nLevel, std::uint64_t nPlace) = 0;
+
+private:
+    std::vector<Level> GetLevels() const override;
+    std::shared_ptr<BlockImage> OpenLevel(unsigned int nLevel) override;
+    const krv::datasources::AuxiliaryData& GetBook() const override { return moRecord.moTags; }
+    void MakeLevel(const Level& oLevel, const krv::datasources::AuxiliaryData& oBook, const Place& oPlace) override;
+    void DropLevel(unsigned int nLevel, const krv::datasources::AuxiliaryData& oBook, const Place& oPlace) override;
+    void WriteBook(const krv::datasources::AuxiliaryData& oBook, bool bValid, const Place& oPlace) override;
+
+    void Change(RecordText oRecord) const;
+
+    mutable RecordText moRecord;
+    krv::ogc::cs::GeocodingInfo moGeocoding;
+    std::map<unsigned int, std::shared_ptr<BlockImage>> moOpened; // levels
+};
+
+} // namespace krv::plugins::support

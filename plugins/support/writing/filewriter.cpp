@@ -1,0 +1,74 @@
+#include "plugins/support/writing/filewriter.h"
+
+#include "toolkit/exceptions/exceptions.h"
+
+#include <utility>
+
+namespace krv::plugins::support
+{
+
+FileWriter::FileWriter(const std::string& fileName) : moFileName(fileName), mbNamed(false) {}
+
+FileWriter::FileWriter(std::shared_ptr<File> poFile)
+    : moFileName(poFile->GetName()), mpoFile(std::move(poFile)), mbNamed(true)
+{
+}
+
+FileWriter::~FileWriter() = default;
+
+void FileWriter::CheckWritable(const Place& oPlace) const
+{
+    if (mbEnded)
+        throw DataException(moFileName + ": the dataset is closed", oPlace);
+}
+
+void FileWriter::MakeFile()
+{
+    mpoNew = std::make_unique<NewFile>(moFileName, mbReplaces);
+    mpoFile = mpoNew->GetFile();
+}
+
+void FileWriter::RemoveFile() noexcept
+{
+    mpoFile.reset();
+    mpoNew.reset();
+}
+
+void FileWriter::SetNamed()
+{
+    mpoNew.reset();
+    mbNamed = true;
+}
+
+void FileWriter::Synchronize()
+{
+    CheckWritable();
+    if (!HasFile())
+        return;
+    Store();
+    if (mbNamed)
+        return;
+    mpoNew->TakeName(mbReplaces);
+    SetNamed();
+}
+
+void FileWriter::Finish()
+{
+    Synchronize();
+    End();
+}
+
+void FileWriter::End()
+{
+    mbEnded = true;
+    if (mpoFile)
+        mpoFile->EndWriting();
+}
+
+void FileWriter::Discard() noexcept
+{
+    End();
+    mpoNew.reset();
+}
+
+} // namespace krv::plugins::support

@@ -1,0 +1,71 @@
+#pragma once
+
+#include "plugins/support/file/file.h"
+#include "plugins/support/writing/newfile.h"
+
+#include <memory>
+#include <string>
+
+namespace krv::plugins::support
+{
+
+// The life of a file that is written. What changes is the file's after Synchronize or Finish; a new file has its name
+// only then, so that it is whole or absent, and one that is discarded before is removed. A format derives from it and
+// says what there is to store. One thread at a time.
+class FileWriter
+{
+public:
+    // A new file, which MakeFile makes.
+    explicit FileWriter(const std::string& fileName);
+    // An existing one, open for it.
+    explicit FileWriter(std::shared_ptr<File> poFile);
+    // A derived class discards what it has not stored.
+    virtual ~FileWriter();
+    FileWriter(const FileWriter&) = delete;
+    FileWriter& operator=(const FileWriter&) = delete;
+
+    const std::string& GetFileName() const { return moFileName; }
+    // Null before a new file is made.
+    const std::shared_ptr<File>& GetFile() const { return mpoFile; }
+    bool HasFile() const { return mpoFile != nullptr; }
+    // Whether the file lies under its own name.
+    bool IsNamed() const { return mbNamed; }
+    bool IsEnded() const { return mbEnded; }
+    // A new file takes its name only when nobody has it.
+    void KeepExisting() { mbReplaces = false; }
+    // Throws DataException when writing has ended.
+    void CheckWritable(const Place& oPlace = Place::Current()) const;
+    // Whether something would be lost if the writer went now.
+    bool HasUnsaved() const { return !mbEnded && HasFile() && (!mbNamed || HoldsChanges()); }
+
+    void Synchronize();
+    // The same for the last time.
+    virtual void Finish();
+    // Ends writing, and removes a new file that has not got its name. Reading goes on.
+    virtual void Discard() noexcept;
+
+protected:
+    // Brings what changed, and what is held back, into the file and to the disk. Not called without a file.
+    virtual void Store() = 0;
+    virtual bool HoldsChanges() const = 0;
+
+    void MakeFile();
+    // Back to before MakeFile.
+    void RemoveFile() noexcept;
+    // Ends writing, without storing anything.
+    void End();
+    // Whether a file of the name gives way to this one.
+    bool TakesPlace() const { return mbNamed || mbReplaces; }
+    // What was made has its name, or what took its place.
+    void SetNamed();
+
+private:
+    std::string moFileName;
+    std::shared_ptr<File> mpoFile;
+    std::unique_ptr<NewFile> mpoNew; // until it has its name
+    bool mbNamed;
+    bool mbReplaces = true;
+    bool mbEnded = false;
+};
+
+} // namespace krv::plugins::support

@@ -1,0 +1,34 @@
+#pragma once
+
+#include "plugins/support/file/file.h"
+
+#include <memory>
+#include <string>
+
+namespace krv::plugins::support
+{
+
+// A file that comes into being: under a temporary name in its folder, of this process alone, until it is whole and
+// takes its own. One that goes before is removed.
+class NewFile
+{
+public:
+    // bReplaces: whether a file of the name may be replaced. Throws FileNotFoundException when there is no such folder,
+    // and IOException when the folder must not be written, when a folder, a device or the like has the name, or a file
+    // that must not be written or replaced.
+    NewFile(const std::string& fileName, bool bReplaces, const Place& oPlace = Place::Current());
+    ~NewFile();
+    NewFile(const NewFile&) = delete;
+    NewFile& operator=(const NewFile&) = delete;
+
+    const std::shared_ptr<File>& GetFile() const { return mpoFile; }
+    // As File::Rename. After a failure the file is as it was before.
+    void TakeName(bool bReplaces, const Place& oPlace = Place::Current());
+
+private:
+    std::string moFileName;
+    std::string moTemporary; // empty when it has its name
+    std::shared_ptr<File> mpoFile;
+};
+
+} // namespace krv::plugins::support

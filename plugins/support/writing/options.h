@@ -1,0 +1,88 @@
+#pragma once
+
+#include "toolkit/exceptions/place.h"
+
+#include <cstdint>
+#include <functional>
+#include <string>
+#include <type_traits>
+#include <utility>
+#include <vector>
+
+namespace krv::plugins::support
+{
+
+// What users may say of a new file: KEY=VALUE, separated by blanks, in any letter case. A format adds its keys, in
+// capitals, with the place that the value of each goes to; one that is not given leaves its place alone.
+class Options
+{
+public:
+    // A key as users are told of it, and what it takes: "YES, NO", "a number from 1 to 9".
+    struct Description
+    {
+        std::string moKey;
+        std::string moTakes;
+    };
+
+    // One of some words, in capitals. usual: a word for what the place holds already, which texts do not list.
+    template <typename T>
+    void AddChoice(const std::string& key, T& oTarget,
+                   const std::vector<std::pair<std::string, std::type_identity_t<T>>>& oChoices,
+                   const std::string& usual = {})
+    {
+        std::string takes;
+        for (const auto& [word, oValue] : oChoices)
+            takes += (takes.empty() ? "" : ", ") + word;
+        const auto Take = [&oTarget, oChoices, usual](const std::string& value)
+        {
+            const std::string upper = ToUpper(value);
+            for (const auto& [word, oValue] : oChoices)
+                if (word == upper)
+                    return oTarget = oValue, true;
+            return !usual.empty() && upper == usual;
+        };
+        moKeys.push_back({{key, takes}, Take});
+    }
+
+    void AddFlag(const std::string& key, bool& bTarget) { AddChoice(key, bTarget, {{"YES", true}, {"NO", false}}); }
+
+    template <typename T>
+    void AddNumber(const std::string& key, T& oTarget, std::uint32_t nFrom, std::uint32_t nTo)
+    {
+        const auto Take = [&oTarget, nFrom, nTo](const std::string& value)
+        {
+            std::uint32_t nValue = 0;
+            const bool bNumber = ParseNumber(value, nValue) && nValue >= nFrom && nValue <= nTo;
+            if (bNumber)
+                oTarget = static_cast<T>(nValue);
+            return bNumber;
+        };
+        moKeys.push_back({{key, "a number from " + std::to_string(nFrom) + " to " + std::to_string(nTo)}, Take});
+    }
+
+    // Any text without blanks, as it stands.
+    void AddText(const std::string& key, std::string& target);
+
+    // Throws DataException for what is not of the form, a key that is not known or given twice, and a value that the
+    // key does not take.
+    void Parse(const std::string& options, const Place& oPlace = Place::Current());
+
+    // Whether the text that was parsed has a key.
+    bool IsGiven(const std::string& key) const;
+    std::vector<Description> Describe() const;
+
+private:
+    struct Key
+    {
+        Description moDescription;
+        std::function<bool(const std::string& value)> moTake; // false for what it does not take
+        bool mbGiven = false;
+    };
+
+    static std::string ToUpper(std::string text);
+    static bool ParseNumber(const std::string& text, std::uint32_t& nValue);
+
+    std::vector<Key> moKeys;
+};
+
+} // namespace krv::plugins::support

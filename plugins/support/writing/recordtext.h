@@ -1,0 +1,48 @@
+#pragma once
+
+#include "datasources/metadata/auxiliarydata.h"
+#include "toolkit/ogc/cs/geocodinginfo.h"
+#include "toolkit/ogc/cs/icrs.h"
+
+#include <cstdint>
+#include <istream>
+#include <map>
+#include <memory>
+#include <string>
+
+namespace krv::plugins::support
+{
+
+// A record as lines of text, for formats that have no other form for it:
+//     scene=alps          a tag of the file
+//     [2]band=red         of channel 2
+//     [2]=Red             its description
+//     [crs]=EPSG:32632    the reference system, as any text that defines one
+//     [geocoding]=...     the six terms
+//     [level 2]=81920     a number that the format finds the level by
+// Lines without "=" mean nothing. In keys and values %XX stands for the byte of that hexadecimal number: a key has none
+// of %, = and control characters otherwise, nor a [ at its beginning, and a value none of % and control characters.
+class RecordText
+{
+public:
+    krv::datasources::AuxiliaryData moTags;
+    std::map<unsigned int, std::uint64_t> moLevels; // from 2 on
+
+    // Adds the lines up to the end; channels that moTags does not have are nobody's.
+    void Read(std::istream& oLines);
+    std::string Write() const;
+
+    // Null when there is none. Throws DataException for a text that defines no system.
+    std::unique_ptr<krv::ogc::cs::ICRS> GetCRS() const;
+    void SetCRS(const krv::ogc::cs::ICRS& oCRS);
+    // The identity when there is none.
+    krv::ogc::cs::GeocodingInfo GetGeocoding() const;
+    void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo);
+
+private:
+    void ReadOwn(const std::string& name, const std::string& value);
+
+    krv::datasources::MetadataMap moOwn; // crs and geocoding
+};
+
+} // namespace krv::plugins::support

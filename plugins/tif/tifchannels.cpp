@@ -1,0 +1,85 @@
+// Channels that come and go: the image of a TIFF file and its levels are made anew without decoding what stays.
+#include "datasources/metadata/levelbook.h"
+#include "gobs/raster/rasterinfo.h"
+#include "plugins/tif/tifdataset.h"
+#include "plugins/tif/writing/channeleditor.h"
+#include "plugins/tif/writing/metadatawriter.h"
+
+#include <numeric>
+
+namespace krv::plugins::tif
+{
+
+void TifDataset::AddNewChannel(const krv::gobs::RasterInfo& oInfo)
+{
+    const Place oPlace = Place::Current();
+    GetEditor("channels cannot be added", oPlace);
+    if (oInfo.GetWidth() != GetWidth() || oInfo.GetHeight() != GetHeight())
+        Refuse("a channel of another size cannot be added", oPlace);
+    const krv::gobs::DataType oType = GetLayout().GetPlane(0).moType;
+    if (oInfo.GetDataType() != oType || mpoPage->GetForm().moSample.meWidening != Widening::eNone)
+        Refuse("TIFF cannot mix the types " + oType.Describe() + " and " + oInfo.GetDataType().Describe() +
+                   " in one image",
+               oPlace);
+    if (std::uint64_t{GetChanCount()} + oInfo.GetChansCount() > UINT16_MAX)
+        Refuse("TIFF holds at most 65535 channels", oPlace);
+    std::vector<unsigned int> oSources(GetChanCount());
+    std::iota(oSources.begin(), oSources.end(), 1u);
+    oSources.resize(oSources.size() + oInfo.GetChansCount(), 0);
+    ChangeChannels(oSources, oPlace);
+}
+
+void TifDataset::DeleteChannel(unsigned int nChannel)
+{
+    const Place oPlace = Place::Current();
+    GetEditor("channels cannot be deleted", oPlace);
+    if (nChannel == 0 || nChannel > GetChanCount())
+        Refuse("channel " + std::to_string(nChannel) + " does not exist", oPlace);
+    if (GetChanCount() == 1)
+        Refuse("the only channel cannot be deleted", oPlace);
+    if (mpoPage->GetForm().moSample.meWidening != Widening::eNone)
+        Refuse("channels of this kind cannot be deleted", oPlace);
+    std::vector<unsigned int> oSources(GetChanCount());
+    std::iota(oSources.begin(), oSources.end(), 1u);
+    oSources.erase(oSources.begin() + (nChannel - 1));
+    ChangeChannels(oSources, oPlace);
+}
+
+// The record is taken off the old channels and put on the new ones.
+void TifDataset::ChangeChannels(const std::vector<unsigned int>& oSources, const Place& oPlace)
+{
+    FileEditor& oEditor = *mpoEditor;
+    oEditor.StoreHeld();
+    const krv::datasources::AuxiliaryData oOld = ReadAuxiliaryData();
+    krv::datasources::AuxiliaryData oBare(oOld.GetChannelCount());
+    oBare.SetFileMetadata(oOld.GetFileMetadata());
+    krv::datasources::AuxiliaryData oNew(static_cast<unsigned int>(oSources.size()));
+    oNew.SetFileMetadata(oOld.GetFileMetadata());
+    for (unsigned int nAt = 0; nAt < oSources.size(); ++nAt)
+        if (oSources[nAt] != 0)
+        {
+            oNew.SetChanMetadata(oOld.GetChanMetadata(oSources[nAt]), nAt + 1);
+            oNew.SetChannelDescription(oOld.GetChannelDescription(oSources[nAt]), nAt + 1);
+        }
+        else
+            for (const PageLevel& oLevel : GetLevels(PixelUse::eImage))
+                SetLevelValid(oNew, nAt + 1, oLevel.mnLevel, false, {});
+    std::vector<std::uint64_t> oNumbers = {oEditor.GetPages().front()->mnNumber};
+    for (const PageLevel& oLevel : GetLevels(PixelUse::eImage))
+        oNumbers.push_back(oLevel.moPage.mnOffset);
+    const ChannelEditor oChannels(oEditor, oSources);
+    std::shared_ptr<support::IBlockSource> poSource;
+    Edit(
+        [&]
+        {
+            MetadataWriter(oEditor, oEditor.GetPages().front()).Write(oBare, oPlace);
+            for (const std::uint64_t nNumber : oNumbers)
+                oChannels.Rebuild(oEditor.GetPage(nNumber), oPlace);
+            MetadataWriter(oEditor, oEditor.GetPages().front()).Write(oNew, oPlace);
+            poSource = MakeSource(oEditor.GetPages().front(), PixelUse::eImage);
+        });
+    moImages.clear();
+    ShowImage(std::move(poSource));
+}
+
+} // namespace krv::plugins::tif

@@ -1,0 +1,246 @@
+// FileEditor: how changes become the file's.
+#include "plugins/tif/writing/cloudlayout.h"
+#include "plugins/tif/writing/directorybytes.h"
+#include "plugins/tif/writing/fileeditor.h"
+#include "plugins/tif/writing/pagewriter.h"
+
+#include <algorithm>
+#include <utility>
+
+#include <tiff.h>
+
+namespace krv::plugins::tif
+{
+
+namespace
+{
+
+// A file up to this size costs little to be written twice.
+constexpr std::uint64_t SMALL_FILE = std::uint64_t{4} << 20;
+
+} // namespace
+
+// The directory, then the values that are not in the file yet, in one piece; the arrays each in a place of their own.
+FileEditor::Written FileEditor::WriteDirectory(PageModel& oPage, std::uint64_t nNext, bool bDraft)
+{
+    const std::size_t nWord = moHeader.mbBigTiff ? 8 : 4;
+    const std::uint64_t nStriles = oPage.GetStriles();
+    Written oWritten{&oPage, {}, nNext, oPage.moOffsetArray, oPage.moCountArray};
+
+    const auto WriteArray = [&](const StrileList<std::uint64_t>& oValues, Extent& oArray)
+    {
+        if (nStriles * nWord <= nWord || bDraft ||
+            (!oPage.mbStrilesChanged && !oPage.mbArraysStale && oArray.mnBytes != 0))
+            return;
+        const std::vector<unsigned char> oBytes = MakeArray(oValues, moHeader);
+        oArray = mpoSpace->Allocate(oBytes.size());
+        GetFile()->Write(oArray.mnOffset, oBytes.data(), oBytes.size());
+    };
+    WriteArray(oPage.moOffsets, oWritten.moOffsetArray);
+    WriteArray(oPage.moByteCounts, oWritten.moCountArray);
+
+    for (Tag& oTag : oPage.moTags.EditTags())
+        if (oTag.GetBytes() > nWord && oTag.moStored.mnBytes == 0)
+        {
+            Extent oPlace = mpoSpace->Allocate(oTag.GetBytes());
+            GetFile()->Write(oPlace.mnOffset, oTag.moBytes.data(), oTag.moBytes.size());
+            oTag.moStored = oPlace;
+        }
+
+    // A directory that is only written ahead names no arrays: whoever reads by it knows the places.
+    const std::uint64_t nNone = moHeader.GetBytes();
+    std::vector<unsigned char> oBytes = MakeDirectory(oPage, moHeader, bDraft ? nNone : oWritten.moOffsetArray.mnOffset,
+                                                      bDraft ? nNone : oWritten.moCountArray.mnOffset, nNext);
+    const bool bRoot = !bDraft && &oPage == moPages.front().get();
+    oWritten.moDirectory = mpoSpace->Allocate(oBytes.size() + (bRoot ? moRecord.GetBytes() : 0));
+    if (bRoot)
+    {
+        moRecord.mnFileBytes = std::max(GetFile()->GetSize(), oWritten.moDirectory.GetEnd());
+        const std::vector<unsigned char> oRecord = moRecord.Make(oWritten.moDirectory.mnOffset);
+        oBytes.insert(oBytes.end(), oRecord.begin(), oRecord.end());
+    }
+    GetFile()->Write(oWritten.moDirectory.mnOffset, oBytes.data(), oBytes.size());
+    return oWritten;
+}
+
+bool FileEditor::IsChanged() const
+{
+    return mbChanged || std::any_of(moPages.begin(), moPages.end(),
+                                    [](const std::shared_ptr<PageModel>& poPage) { return poPage->IsChanged(); });
+}
+
+bool FileEditor::HoldsChanges() const
+{
+    const auto Holds = [](const std::weak_ptr<PageWriter>& poWeak)
+    {
+        const std::shared_ptr<PageWriter> poWriter = poWeak.lock();
+        return poWriter && poWriter->Holds();
+    };
+    return IsChanged() || std::any_of(moWriters.begin(), moWriters.end(), Holds);
+}
+
+// From the last page to the first: each names the place of the next one.
+std::vector<FileEditor::Written> FileEditor::WriteDirectories()
+{
+    std::vector<Written> oWritten;
+    try
+    {
+        std::vector<std::uint64_t> oBelow;
+        for (const std::shared_ptr<PageModel>& poPage : moPages)
+            if (poPage->mbBelowFirst)
+            {
+                if (poPage->IsChanged())
+                    oWritten.push_back(WriteDirectory(*poPage, poPage->mnNext, false));
+                oBelow.push_back(poPage->IsChanged() ? oWritten.back().moDirectory.mnOffset
+                                                     : poPage->moDirectory.mnOffset);
+            }
+        TagList& oTags = moPages.front()->moTags;
+        if (oBelow.empty() && mbBelowFirst)
+            oTags.Remove(TIFFTAG_SUBIFD);
+        else if (oBelow != oTags.GetNumbers(TIFFTAG_SUBIFD) && mbBelowFirst)
+            oTags.SetNumbers(TIFFTAG_SUBIFD, moHeader.mbBigTiff ? TIFF_IFD8 : TIFF_IFD, oBelow);
+
+        std::uint64_t nNext = 0;
+        for (std::size_t nAt = moPages.size() - oBelow.size(); nAt-- > 0;)
+        {
+            PageModel& oPage = *moPages[nAt];
+            const bool bWrite = oPage.IsChanged() || oPage.mnNext != nNext;
+            if (bWrite)
+                oWritten.push_back(WriteDirectory(oPage, nNext, false));
+            nNext = bWrite ? oWritten.back().moDirectory.mnOffset : oPage.moDirectory.mnOffset;
+        }
+    }
+    catch (...)
+    {
+        ReleaseWritten(oWritten);
+        throw;
+    }
+    return oWritten;
+}
+
+void FileEditor::ReleaseWritten(const std::vector<Written>& oWritten)
+{
+    for (const Written& oDirectory : oWritten)
+        for (const Extent& oExtent : {oDirectory.moDirectory, oDirectory.moOffsetArray, oDirectory.moCountArray})
+            if (oExtent.mnBytes != 0 && mpoSpace->IsFresh(oExtent))
+                mpoSpace->Release(oExtent);
+}
+
+void FileEditor::StoreHeld()
+{
+    for (const std::weak_ptr<PageWriter>& poWeak : moWriters)
+        if (const std::shared_ptr<PageWriter> poWriter = poWeak.lock())
+            poWriter->Flush();
+}
+
+void FileEditor::Store()
+{
+    StoreHeld();
+    if (IsChanged())
+        Commit(WriteDirectories());
+}
+
+// Whether a new, small file holds a good deal of what was given up again while it was made: directories above all.
+bool FileEditor::IsWasteful() const
+{
+    if (IsNamed() || GetFile()->GetSize() > SMALL_FILE)
+        return false;
+    std::uint64_t nUsed = 0;
+    for (const Extent& oPiece : ListUsed())
+        nUsed += oPiece.mnBytes;
+    return GetFile()->GetSize() > nUsed + nUsed / 20;
+}
+
+// A file that is to be laid out for a network gets its order at the very end, and so does one that would be larger than
+// it need be: a second temporary file takes its place.
+void FileEditor::Finish()
+{
+    CheckWritable();
+    if (!HasFile())
+        return End();
+    Store();
+    if (!moOptions.mbCloud && !IsWasteful())
+    {
+        Synchronize();
+        // What was written to look at the file since then is of no more use.
+        GetFile()->CutBack(mnCommittedSize);
+        return End();
+    }
+    for (const std::shared_ptr<PageModel>& poPage : moPages)
+        LoadTags(*poPage);
+    // Only the file that has got the name is replaced by its better form.
+    if (IsNamed())
+        GetFile()->Flush();
+    support::NewFile oLaidOut(GetFileName(), TakesPlace());
+    WriteCloudLayout(moPages, moHeader, *GetFile(), *oLaidOut.GetFile(), moOptions.mbCloud);
+    oLaidOut.GetFile()->Flush();
+    oLaidOut.TakeName(TakesPlace());
+    SetNamed();
+    End();
+}
+
+// Pages that came and went again leave nothing to be written.
+void FileEditor::Commit(const std::vector<Written>& oWritten)
+{
+    if (!oWritten.empty())
+        Publish(oWritten);
+    for (const std::shared_ptr<PageModel>& poPage : moPages)
+        for (const Extent& oExtent : poPage->moTags.TakeReleased())
+            mpoSpace->Release(oExtent);
+    for (const Extent& oExtent : std::exchange(moReleased, {}))
+        mpoSpace->Release(oExtent);
+    mbChanged = false;
+    // Nobody reads what has no name yet.
+    if (!oWritten.empty())
+        mpoSpace->Reuse(IsNamed() ? GetFile()->FindHeld() : support::Space::Roots(std::in_place));
+}
+
+// What was written reaches the disk before the one number that makes it the file's, and that before anything of the
+// former state is given up.
+void FileEditor::Publish(const std::vector<Written>& oWritten)
+{
+    const Written& oFirst = oWritten.back();
+    const bool bFirst = oFirst.mpPage == moPages.front().get();
+    try
+    {
+        GetFile()->Flush();
+    }
+    catch (...)
+    {
+        ReleaseWritten(oWritten);
+        throw;
+    }
+    mnCommittedSize = GetFile()->GetSize();
+    moHeader.mnFirstDirectory = bFirst ? oFirst.moDirectory.mnOffset : moPages.front()->moDirectory.mnOffset;
+    mpoSpace->Age(moHeader.mnFirstDirectory);
+    unsigned char aHeader[FileHeader::BYTES] = {};
+    moHeader.Write(aHeader, moHeader.mnFirstDirectory);
+    const std::size_t nPlace = moHeader.mbBigTiff ? 8 : 4;
+    const bool bNew = !IsNamed();
+    GetFile()->Write(bNew ? 0 : nPlace, aHeader + (bNew ? 0 : nPlace), moHeader.GetBytes() - (bNew ? 0 : nPlace));
+    GetFile()->Flush();
+
+    for (const Written& oDirectory : oWritten)
+        Adopt(oDirectory);
+}
+
+void FileEditor::Adopt(const Written& oWritten)
+{
+    PageModel& oPage = *oWritten.mpPage;
+    const auto Replace = [this](Extent& oOld, const Extent& oNew)
+    {
+        if (oOld.mnBytes != 0 && oOld.mnOffset != oNew.mnOffset)
+            mpoSpace->Release(oOld);
+        oOld = oNew;
+    };
+    Replace(oPage.moDirectory, oWritten.moDirectory);
+    Replace(oPage.moOffsetArray, oWritten.moOffsetArray);
+    Replace(oPage.moCountArray, oWritten.moCountArray);
+    Replace(oPage.moDraft, {});
+    oPage.mnNext = oWritten.mnNext;
+    oPage.mbStrilesChanged = false;
+    oPage.mbArraysStale = false;
+    oPage.moTags.Settle();
+}
+
+} // namespace krv::plugins::tif
