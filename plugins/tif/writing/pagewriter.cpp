@@ -1,7 +1,7 @@
 #include "plugins/tif/writing/pagewriter.h"
 
-#include "plugins/support/codec/interleave.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/raster/interleave.h"
 
 #include <algorithm>
 #include <utility>
@@ -90,12 +90,12 @@ void PageWriter::Read(const support::BlockAddress& oBlock, const support::PixelR
                     return;
                 const support::PixelRect oShared = Intersect(oRect, oStrile.moRect);
                 const std::size_t nHeldPitch = oStrile.moRect.mnWidth * GetPixelBytes();
-                codec::CopyRows(oFound->second->moPixels.data() + (oShared.mnY - oStrile.moRect.mnY) * nHeldPitch +
-                                    (oShared.mnX - oStrile.moRect.mnX) * GetPixelBytes(),
-                                nHeldPitch,
-                                pTarget + (oShared.mnY - oRect.mnY) * nPitch +
-                                    (oShared.mnX - oRect.mnX) * GetPixelBytes(),
-                                nPitch, oShared.mnWidth * GetPixelBytes(), oShared.mnHeight);
+                raster::CopyRows(oFound->second->moPixels.data() + (oShared.mnY - oStrile.moRect.mnY) * nHeldPitch +
+                                     (oShared.mnX - oStrile.moRect.mnX) * GetPixelBytes(),
+                                 nHeldPitch,
+                                 pTarget + (oShared.mnY - oRect.mnY) * nPitch +
+                                     (oShared.mnX - oRect.mnX) * GetPixelBytes(),
+                                 nPitch, oShared.mnWidth * GetPixelBytes(), oShared.mnHeight);
             });
 }
 
@@ -139,10 +139,10 @@ void PageWriter::WritePart(const Strile& oStrile, const support::PixelRect& oPar
         return WriteInPlace(oStrile, oPart, pSource, nPitch);
     Held& oHeld = Hold(oStrile);
     const std::size_t nHeldPitch = oStrile.moRect.mnWidth * GetPixelBytes();
-    codec::CopyRows(pSource, nPitch,
-                    oHeld.moPixels.data() + (oPart.mnY - oStrile.moRect.mnY) * nHeldPitch +
-                        (oPart.mnX - oStrile.moRect.mnX) * GetPixelBytes(),
-                    nHeldPitch, oPart.mnWidth * GetPixelBytes(), oPart.mnHeight);
+    raster::CopyRows(pSource, nPitch,
+                     oHeld.moPixels.data() + (oPart.mnY - oStrile.moRect.mnY) * nHeldPitch +
+                         (oPart.mnX - oStrile.moRect.mnX) * GetPixelBytes(),
+                     nHeldPitch, oPart.mnWidth * GetPixelBytes(), oPart.mnHeight);
 }
 
 void PageWriter::WriteInPlace(const Strile& oStrile, const support::PixelRect& oPart, const unsigned char* pSource,
