@@ -6,10 +6,10 @@
 #include "benchmarks/support/measure.h"
 #include "plugins/support/codec/bits.h"
 #include "plugins/support/codec/deflate.h"
-#include "plugins/support/codec/interleave.h"
 #include "plugins/support/codec/lzw.h"
 #include "plugins/support/codec/predictor.h"
 #include "plugins/support/codec/zstd.h"
+#include "toolkit/raster/interleave.h"
 
 #include <array>
 #include <cmath>
@@ -242,7 +242,7 @@ void MeasureKernel(const std::string& name, std::size_t nBytes, const std::funct
     {
         for (int i = 0; i < REPEATS; ++i)
         {
-            codec::CopyRows(oFrom.data(), nBytes, oTo.data(), nBytes, nBytes, 1);
+            krv::raster::CopyRows(oFrom.data(), nBytes, oTo.data(), nBytes, nBytes, 1);
             krv::benchmarks::Keep(oTo.data());
         }
     };
@@ -277,25 +277,26 @@ void MeasureChannels(Bytes& oFrom, Bytes& oTo)
     for (const std::size_t nSampleBytes : {1, 2, 4, 8})
         for (const std::size_t nChannels : {2, 3, 4, 7})
         {
-            const codec::PixelArea oArea{TILE, TILE, nSampleBytes};
+            const krv::raster::PixelArea oArea{TILE, TILE, nSampleBytes};
             const std::size_t nPlane = TILE * nSampleBytes, nPitch = nPlane * nChannels;
             const std::string kind = std::to_string(nChannels) + " x " + std::to_string(nSampleBytes * 8) + " bits";
             std::vector<const unsigned char*> oPlanes;
             for (std::size_t k = 0; k < nChannels; ++k)
                 oPlanes.push_back(oFrom.data() + k * nPlane * TILE);
-            MeasureKernel("planes together, " + kind, nPitch * TILE,
-                          [&]
-                          { codec::InterleavePlanes(oPlanes.data(), nPlane, oTo.data(), nPitch, nChannels, oArea); });
-            MeasureKernel("one channel out of " + kind, nPlane * TILE,
-                          [&]
-                          { codec::ExtractChannel(oFrom.data(), nPitch, 1, nChannels, oTo.data(), nPlane, oArea); });
-            MeasureKernel("one channel into " + kind, nPlane * TILE,
-                          [&] { codec::PlaceChannel(oFrom.data(), nPlane, oTo.data(), nPitch, 1, nChannels, oArea); });
+            MeasureKernel(
+                "planes together, " + kind, nPitch * TILE,
+                [&] { krv::raster::InterleavePlanes(oPlanes.data(), nPlane, oTo.data(), nPitch, nChannels, oArea); });
+            MeasureKernel(
+                "one channel out of " + kind, nPlane * TILE,
+                [&] { krv::raster::ExtractChannel(oFrom.data(), nPitch, 1, nChannels, oTo.data(), nPlane, oArea); });
+            MeasureKernel(
+                "one channel into " + kind, nPlane * TILE,
+                [&] { krv::raster::PlaceChannel(oFrom.data(), nPlane, oTo.data(), nPitch, 1, nChannels, oArea); });
             if (nChannels >= 3)
                 MeasureKernel("three turned round of " + kind, nPlane * 3 * TILE,
                               [&] {
-                                  codec::GatherChannels(oFrom.data(), nPitch, nChannels, oTo.data(), nPlane * 3,
-                                                        CHANNELS.data(), 3, oArea);
+                                  krv::raster::GatherChannels(oFrom.data(), nPitch, nChannels, oTo.data(), nPlane * 3,
+                                                              CHANNELS.data(), 3, oArea);
                               });
         }
 }

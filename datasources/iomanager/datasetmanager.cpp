@@ -6,6 +6,7 @@
 #include "datasources/interfaces/ifileiobuilder.h"
 #include "datasources/iomanager/formatcapabilities.h"
 #include "toolkit/core/core.h"
+#include "toolkit/core/lettercase.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/xml/xmlutil.h"
@@ -113,17 +114,6 @@ bool ReadHeader(const std::string& name, Header& oHeader)
 bool IsGenericFile(std::FILE* pFile, void*)
 {
     return fpTestFlag(pFile, eGenericFile) != 0;
-}
-
-// ASCII alone changes: the names of formats do not depend on the locale.
-std::string ToUpper(std::string text)
-{
-    for (char& nCharacter : text)
-    {
-        if (nCharacter >= 'a' && nCharacter <= 'z')
-            nCharacter = static_cast<char>(nCharacter - 'a' + 'A');
-    }
-    return text;
 }
 
 } // namespace

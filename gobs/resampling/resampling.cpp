@@ -1,9 +1,9 @@
 #include "gobs/resampling/resampling.h"
 
+#include "toolkit/core/lettercase.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
-#include <cctype>
 #include <iterator>
 
 namespace krv::gobs
@@ -18,10 +18,7 @@ constexpr const char* NAMES[] = {"NEAREST", "AVERAGE", "MODE", "BILINEAR", "CUBI
 
 Resampling ParseResampling(const std::string& name)
 {
-    std::string upper = name;
-    for (char& nCharacter : upper)
-        nCharacter = static_cast<char>(std::toupper(static_cast<unsigned char>(nCharacter)));
-    const auto* const pFound = std::find(std::begin(NAMES), std::end(NAMES), upper);
+    const auto* const pFound = std::find(std::begin(NAMES), std::end(NAMES), ToUpper(name));
     if (pFound == std::end(NAMES))
         throw krv::ParameterException("The resampling method " + name + " is not known",
                                       krv::ParameterException::eInvalidValue, "name");

@@ -1,7 +1,7 @@
 #include "plugins/support/codec/bits.h"
 
-#include "plugins/support/codec/detail/memoryaccess.h"
-#include "plugins/support/codec/detail/vector16.h"
+#include "toolkit/simd/memoryaccess.h"
+#include "toolkit/simd/vector16.h"
 
 #include <algorithm>
 #include <array>
@@ -12,9 +12,9 @@ namespace krv::plugins::codec
 namespace
 {
 
-using detail::Load;
-using detail::Store;
-using detail::Swap;
+using simd::Load;
+using simd::Store;
+using simd::Swap;
 
 // Bits packed most significant first.
 struct BitSource
@@ -25,7 +25,7 @@ struct BitSource
     // The sixty-four bits from nBit on; the last seven of them are unspecified. Needs eight bytes.
     std::uint64_t GetInside(std::uint64_t nBit) const
     {
-        return detail::LoadBigEndian<std::uint64_t>(mpoBytes + (nBit >> 3)) << (nBit & 7);
+        return simd::LoadBigEndian<std::uint64_t>(mpoBytes + (nBit >> 3)) << (nBit & 7);
     }
 
     // nBits bits from nBit on, at the top of the result. Bits behind the end are 0.
@@ -67,11 +67,11 @@ struct NarrowFloat
     static constexpr std::uint32_t STEP = (128U - (1U << (nExponentBits - 1)) + 1 - nFractionBits) << 23;
 };
 
-#if defined(KRV_CODEC_VECTORS)
-using detail::LoadVector;
-using detail::Shuffle;
-using detail::StoreVector;
-using detail::Vector;
+#if defined(KRV_VECTOR16)
+using simd::LoadVector;
+using simd::Shuffle;
+using simd::StoreVector;
+using simd::Vector;
 
 constexpr unsigned int WIDEST_IN_VECTORS = 25; // with seven bits in front of it, a sample still fits four bytes
 
@@ -281,7 +281,7 @@ void UnpackSingleBits(const unsigned char* source, std::size_t nBytes, unsigned 
 {
     const std::size_t nWhole = std::min(nBytes, nSamples / 8);
     std::size_t i = 0;
-#if defined(KRV_CODEC_VECTORS)
+#if defined(KRV_VECTOR16)
     static constexpr Shuffle FIRST = Shuffle::Make([](std::size_t k) { return k / 8; });
     const Vector oBits = _mm_set1_epi64x(0x0102040810204080);
     const Vector oOne = _mm_set1_epi8(1);
@@ -296,7 +296,7 @@ void UnpackSingleBits(const unsigned char* source, std::size_t nBytes, unsigned 
     }
 #endif
     for (; i < nWhole; ++i)
-        detail::StoreLittleEndian(destination + i * 8, SpreadBits(source[i]));
+        simd::StoreLittleEndian(destination + i * 8, SpreadBits(source[i]));
     for (std::size_t k = i * 8; k < nSamples; ++k)
         destination[k] = k / 8 < nBytes ? source[k / 8] >> (7 - k % 8) & 1 : 0;
 }
@@ -352,10 +352,9 @@ template <typename T>
 void SwapEach(const unsigned char* source, unsigned char* destination, std::size_t nCount)
 {
     std::size_t i = 0;
-#if defined(KRV_CODEC_VECTORS)
+#if defined(KRV_VECTOR16)
     for (constexpr std::size_t STEP = 16 / sizeof(T); i + STEP <= nCount; i += STEP)
-        detail::StoreVector(destination + i * sizeof(T),
-                            detail::SwapVector<T>(detail::LoadVector(source + i * sizeof(T))));
+        simd::StoreVector(destination + i * sizeof(T), simd::SwapVector<T>(simd::LoadVector(source + i * sizeof(T))));
 #endif
     for (; i < nCount; ++i)
         Store(destination + i * sizeof(T), Swap(Load<T>(source + i * sizeof(T))));
@@ -439,7 +438,7 @@ void Float24ToFloat(const unsigned char* source, unsigned char* destination, std
     for (std::size_t i = Widen24s(source, destination, nCount); i < nCount; ++i)
     {
         const unsigned char* at = source + i * 3;
-        const std::uint32_t nLow = at[detail::LITTLE ? 0 : 2], nMiddle = at[1], nHigh = at[detail::LITTLE ? 2 : 0];
+        const std::uint32_t nLow = at[simd::LITTLE ? 0 : 2], nMiddle = at[1], nHigh = at[simd::LITTLE ? 2 : 0];
         Store(destination + i * 4, Widen<7, 16>(nHigh << 16 | nMiddle << 8 | nLow));
     }
 }
@@ -456,7 +455,7 @@ void FloatToFloat24(const unsigned char* source, unsigned char* destination, std
     {
         const std::uint32_t nNarrow = Narrow<7, 16>(Load<std::uint32_t>(source + i * 4));
         for (std::size_t k = 0; k < 3; ++k)
-            destination[i * 3 + k] = static_cast<unsigned char>(nNarrow >> 8 * (detail::LITTLE ? k : 2 - k));
+            destination[i * 3 + k] = static_cast<unsigned char>(nNarrow >> 8 * (simd::LITTLE ? k : 2 - k));
     }
 }
 

@@ -1,6 +1,6 @@
 #include "plugins/support/codec/lzw.h"
 
-#include "plugins/support/codec/detail/memoryaccess.h"
+#include "toolkit/simd/memoryaccess.h"
 
 #include <algorithm>
 
@@ -56,7 +56,7 @@ inline void CopyVectors(const unsigned char* source, unsigned char* destination,
     std::size_t i = 0;
     do
     {
-        detail::Copy16(destination + i, source + i);
+        simd::Copy16(destination + i, source + i);
         i += 16;
     } while (i < nBytes);
 }
@@ -259,7 +259,7 @@ void LzwRun<bOld>::RunWidth()
         const std::size_t nKind = GetKind(nEntry);
         if (nKind < MOST_KEPT) [[likely]]
         {
-            detail::StoreLittleEndian(out, nEntry);
+            simd::StoreLittleEndian(out, nEntry);
             out += nKind;
             nGrown = nEntry + ONE_BYTE;
             nShift = nKind * 8;
@@ -267,7 +267,7 @@ void LzwRun<bOld>::RunWidth()
         }
         const std::size_t nLength = nKind == MOST_KEPT ? nKind : GetLongLength(nEntry);
         if (nKind == MOST_KEPT)
-            detail::StoreLittleEndian(out, nEntry);
+            simd::StoreLittleEndian(out, nEntry);
         else if (nKind == NO_STRING || mpoEnd - out < static_cast<std::ptrdiff_t>(nLength) + 16 + SLACK)
             return false;
         else
@@ -285,7 +285,7 @@ void LzwRun<bOld>::RunWidth()
     std::size_t nDone = GROUP;
     while (nDone == GROUP && nNext + GROUP <= GetLimit(nWidth) && nBit <= nSafeBits && mpoEnd - out >= SLACK)
     {
-        const Entry nBits = detail::LoadBigEndian<Entry>(mpoInput + (nBit >> 3)) << (nBit & 7);
+        const Entry nBits = simd::LoadBigEndian<Entry>(mpoInput + (nBit >> 3)) << (nBit & 7);
         nDone = 0;
         if (oOne(nBits >> (64 - nWidth), 0) && ++nDone && oOne((nBits >> (64 - 2 * nWidth)) & MASK, 1) && ++nDone &&
             oOne((nBits >> (64 - 3 * nWidth)) & MASK, 2) && ++nDone && oOne((nBits >> (64 - 4 * nWidth)) & MASK, 3))
@@ -297,7 +297,7 @@ void LzwRun<bOld>::RunWidth()
     bool bGood = nDone == GROUP;
     while (bGood && nNext < GetLimit(nWidth) && nBit <= nSafeBits && mpoEnd - out >= SLACK)
     {
-        bGood = oOne((detail::LoadBigEndian<Entry>(mpoInput + (nBit >> 3)) << (nBit & 7)) >> (64 - nWidth), 0);
+        bGood = oOne((simd::LoadBigEndian<Entry>(mpoInput + (nBit >> 3)) << (nBit & 7)) >> (64 - nWidth), 0);
         nNext += bGood;
         next += bGood;
         nBit += bGood * nWidth;

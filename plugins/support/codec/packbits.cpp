@@ -1,6 +1,6 @@
 #include "plugins/support/codec/packbits.h"
 
-#include "plugins/support/codec/detail/memoryaccess.h"
+#include "toolkit/simd/memoryaccess.h"
 
 #include <algorithm>
 #include <cstring>
@@ -46,7 +46,7 @@ Result PackBitsDecoder::Decode(const unsigned char* input, std::size_t nInput, u
                 std::memset(out + i, *input, STEP);
         else if (bInside)
             for (std::size_t i = 0; i < nBytes; i += STEP)
-                detail::Copy16(out + i, input + i);
+                simd::Copy16(out + i, input + i);
         else if (bRun)
             std::memset(out, *input, nWanted);
         else

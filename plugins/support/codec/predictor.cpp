@@ -1,8 +1,8 @@
 #include "plugins/support/codec/predictor.h"
 
-#include "plugins/support/codec/detail/memoryaccess.h"
-#include "plugins/support/codec/detail/vector16.h"
-#include "plugins/support/codec/interleave.h"
+#include "toolkit/raster/interleave.h"
+#include "toolkit/simd/memoryaccess.h"
+#include "toolkit/simd/vector16.h"
 
 #include <array>
 #include <utility>
@@ -13,9 +13,9 @@ namespace krv::plugins::codec
 namespace
 {
 
-using detail::Load;
-using detail::Store;
-using detail::Swap;
+using simd::Load;
+using simd::Store;
+using simd::Swap;
 
 // Works on one row of nBytes bytes whose samples of one channel lie nStride bytes apart.
 using RowFunction = void (*)(const unsigned char* source, unsigned char* destination, std::size_t nBytes,
@@ -53,18 +53,18 @@ void ApplyPlain(const unsigned char* source, unsigned char* destination, std::si
     }
 }
 
-#if defined(KRV_CODEC_VECTORS)
-using detail::Add;
-using detail::LoadVector;
-using detail::StoreVector;
-using detail::Subtract;
-using detail::Vector;
+#if defined(KRV_VECTOR16)
+using simd::Add;
+using simd::LoadVector;
+using simd::StoreVector;
+using simd::Subtract;
+using simd::Vector;
 
 template <typename T, bool bSwap>
 Vector LoadSamples(const unsigned char* source)
 {
     const Vector oValue = LoadVector(source);
-    return bSwap ? detail::SwapVector<T>(oValue) : oValue;
+    return bSwap ? simd::SwapVector<T>(oValue) : oValue;
 }
 
 // Running sums within one vector, by adding it to itself shifted by one, two, four ... pixels.
@@ -87,8 +87,8 @@ Vector Accumulate(Vector oValue)
 template <typename T, bool bSwap, std::size_t nStride>
 void UndoNarrow(const unsigned char* source, unsigned char* destination, std::size_t nBytes, std::size_t)
 {
-    static constexpr detail::Shuffle CARRY =
-        detail::Shuffle::Make([](std::size_t i) { return 16 - nStride + i % nStride; });
+    static constexpr simd::Shuffle CARRY =
+        simd::Shuffle::Make([](std::size_t i) { return 16 - nStride + i % nStride; });
     Vector oSum = _mm_setzero_si128();
     std::size_t i = 0;
     for (; i + 16 <= nBytes; i += 16)
@@ -134,7 +134,7 @@ void ApplyRow(const unsigned char* source, unsigned char* destination, std::size
     {
         const unsigned char* at = source + i - 16;
         const Vector oValue = Subtract<T>(LoadVector(at), LoadVector(at - nStride));
-        StoreVector(destination + i - 16, bSwap ? detail::SwapVector<T>(oValue) : oValue);
+        StoreVector(destination + i - 16, bSwap ? simd::SwapVector<T>(oValue) : oValue);
     }
     ApplyPlain<T, bSwap>(source, destination, i, nStride);
 }
@@ -219,7 +219,7 @@ unsigned char* GetScratch(std::vector<unsigned char>& oScratch, std::size_t nByt
 // The place among the planes of byte nByte of a sample.
 std::size_t GetPlane(std::size_t nByte, std::size_t nSampleBytes)
 {
-    return detail::LITTLE ? nSampleBytes - 1 - nByte : nByte;
+    return simd::LITTLE ? nSampleBytes - 1 - nByte : nByte;
 }
 
 } // namespace
@@ -261,8 +261,8 @@ void UndoFloatingPoint(const unsigned char* source, std::size_t nSourcePitch, un
     for (std::size_t i = 0; i < oShape.mnRows; ++i)
     {
         oUndo(source + i * nSourcePitch, row, oShape.GetRowBytes(), oShape.mnChannels);
-        InterleavePlanes(oPlanes.data(), nSamples, destination + i * nDestinationPitch, 0, nSampleBytes,
-                         {nSamples, 1, 1});
+        raster::InterleavePlanes(oPlanes.data(), nSamples, destination + i * nDestinationPitch, 0, nSampleBytes,
+                                 {nSamples, 1, 1});
     }
 }
 
@@ -275,8 +275,8 @@ void ApplyFloatingPoint(const unsigned char* source, std::size_t nSourcePitch, u
     for (std::size_t i = 0; i < oShape.mnRows; ++i)
     {
         for (std::size_t k = 0; k < nSampleBytes; ++k)
-            ExtractChannel(source + i * nSourcePitch, 0, k, nSampleBytes, row + GetPlane(k, nSampleBytes) * nSamples, 0,
-                           {nSamples, 1, 1});
+            raster::ExtractChannel(source + i * nSourcePitch, 0, k, nSampleBytes,
+                                   row + GetPlane(k, nSampleBytes) * nSamples, 0, {nSamples, 1, 1});
         ApplyRow<std::uint8_t, false>(row, destination + i * nDestinationPitch, oShape.GetRowBytes(),
                                       oShape.mnChannels);
     }

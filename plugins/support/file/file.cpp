@@ -1,6 +1,7 @@
 #include "plugins/support/file/file.h"
 
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/raster/interleave.h"
 
 #include <algorithm>
 #include <cerrno>
@@ -85,13 +86,6 @@ int OpenFlags(File::Mode eMode)
     if (nError == ENOENT || nError == ENOTDIR)
         throw FileNotFoundException(fileName, fileName + ": " + SystemErrorText(nError), oPlace);
     throw IOException(fileName, fileName + ": cannot be opened: " + SystemErrorText(nError), oPlace);
-}
-
-void CopyRows(const unsigned char* pSource, std::size_t nSourcePitch, unsigned char* pTarget, std::size_t nTargetPitch,
-              std::size_t nRowBytes, std::size_t nRows)
-{
-    for (std::size_t nRow = 0; nRow < nRows; ++nRow)
-        std::memcpy(pTarget + nRow * nTargetPitch, pSource + nRow * nSourcePitch, nRowBytes);
 }
 
 bool IsUnknownCall(int nError)
@@ -218,7 +212,7 @@ void File::ReadRows(std::uint64_t nOffset, std::size_t nStoredPitch, std::size_t
         const std::size_t nSpan = (nCount - 1) * nStoredPitch + nRowBytes;
         unsigned char* pSlice = oScratch.Get(nSpan);
         Read(nOffset + static_cast<std::uint64_t>(nRow) * nStoredPitch, pSlice, nSpan, oLocation);
-        CopyRows(pSlice, nStoredPitch, pTarget + nRow * nPitch, nPitch, nRowBytes, nCount);
+        raster::CopyRows(pSlice, nStoredPitch, pTarget + nRow * nPitch, nPitch, nRowBytes, nCount);
     }
 }
 

@@ -1,10 +1,9 @@
 #include "plugins/support/image/blockimage.h"
 
-#include "plugins/support/codec/interleave.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/raster/interleave.h"
 
 #include <algorithm>
-#include <cstring>
 #include <string>
 
 namespace krv::plugins::support
@@ -39,13 +38,6 @@ PixelRect Intersect(const PixelRect& oFirst, const PixelRect& oSecond)
     const unsigned int nY = std::max(oFirst.mnY, oSecond.mnY);
     return {nX, nY, std::min(oFirst.mnX + oFirst.mnWidth, oSecond.mnX + oSecond.mnWidth) - nX,
             std::min(oFirst.mnY + oFirst.mnHeight, oSecond.mnY + oSecond.mnHeight) - nY};
-}
-
-void CopyRows(const unsigned char* pSource, std::size_t nSourcePitch, unsigned char* pTarget, std::size_t nTargetPitch,
-              std::size_t nRowBytes, std::size_t nRows)
-{
-    for (std::size_t nRow = 0; nRow < nRows; ++nRow)
-        std::memcpy(pTarget + nRow * nTargetPitch, pSource + nRow * nSourcePitch, nRowBytes);
 }
 
 } // namespace
@@ -342,8 +334,8 @@ void BlockImage::ReadOnePlane(const Job& oJob, const BlockAddress& oBlock, const
             oPixels = eKeep == Keep::eBlock ? TryLoad(oBlock, oPart) : GetRows(oBlock, oPart);
         if (oPixels.mpFirst == nullptr)
             return mpoSource->ReadBlock(oBlock, oPart, pTarget, oJob.mnPitch);
-        return CopyRows(oPixels.mpFirst, oPixels.mnPitch, pTarget, oJob.mnPitch, oPart.mnWidth * nPixelBytes,
-                        oPart.mnHeight);
+        return raster::CopyRows(oPixels.mpFirst, oPixels.mnPitch, pTarget, oJob.mnPitch, oPart.mnWidth * nPixelBytes,
+                                oPart.mnHeight);
     }
     const std::size_t nRowBytes = std::max<std::size_t>(1, oPart.mnWidth * nPixelBytes);
     const auto nSlice = mbParts && eKeep == Keep::eNothing
@@ -353,10 +345,10 @@ void BlockImage::ReadOnePlane(const Job& oJob, const BlockAddress& oBlock, const
     {
         const PixelRect oSlice{oPart.mnX, oPart.mnY + nRow, oPart.mnWidth, std::min(nSlice, oPart.mnHeight - nRow)};
         const Pixels oPixels = ObtainPart(oBlock, oSlice, eKeep, moScratch);
-        codec::GatherChannels(oPixels.mpFirst, oPixels.mnPitch, moLayout.GetPlane(oBlock.mnPlane).mnChannels,
-                              pTarget + nRow * oJob.mnPitch, oJob.mnPitch, oJob.moChannels.GetPositions().data(),
-                              oJob.moChannels.GetCount(),
-                              {oSlice.mnWidth, oSlice.mnHeight, oJob.moChannels.GetValueBytes()});
+        raster::GatherChannels(oPixels.mpFirst, oPixels.mnPitch, moLayout.GetPlane(oBlock.mnPlane).mnChannels,
+                               pTarget + nRow * oJob.mnPitch, oJob.mnPitch, oJob.moChannels.GetPositions().data(),
+                               oJob.moChannels.GetCount(),
+                               {oSlice.mnWidth, oSlice.mnHeight, oJob.moChannels.GetValueBytes()});
     }
 }
 
@@ -364,7 +356,7 @@ void BlockImage::ReadPlanes(const Job& oJob, const BlockAddress& oBlock, const P
                             unsigned char* pTarget)
 {
     const ChannelSelection& oChannels = oJob.moChannels;
-    const codec::PixelArea oArea{oPart.mnWidth, oPart.mnHeight, oChannels.GetValueBytes()};
+    const raster::PixelArea oArea{oPart.mnWidth, oPart.mnHeight, oChannels.GetValueBytes()};
     const PixelRect oRect = moLayout.GetBlockRect(oBlock.mnColumn, oBlock.mnRow);
     const std::size_t nBlockBytes = std::size_t{oRect.mnWidth} * oRect.mnHeight * oChannels.GetValueBytes();
     const std::size_t nLimit = eKeep != Keep::eNothing ? GetCache().GetBound() : PLANES_BYTES;
@@ -389,7 +381,7 @@ void BlockImage::ReadPlanes(const Job& oJob, const BlockAddress& oBlock, const P
 }
 
 void BlockImage::InterleaveParts(const std::vector<Pixels>& oParts, unsigned char* pTarget, std::size_t nPitch,
-                                 const codec::PixelArea& oArea)
+                                 const raster::PixelArea& oArea)
 {
     const std::size_t nCommonPitch = oParts.front().mnPitch;
     std::vector<const unsigned char*> oFirst;
@@ -397,23 +389,23 @@ void BlockImage::InterleaveParts(const std::vector<Pixels>& oParts, unsigned cha
         if (oPart.mnPitch == nCommonPitch)
             oFirst.push_back(oPart.mpFirst);
     if (oFirst.size() == oParts.size())
-        return codec::InterleavePlanes(oFirst.data(), nCommonPitch, pTarget, nPitch, oParts.size(), oArea);
+        return raster::InterleavePlanes(oFirst.data(), nCommonPitch, pTarget, nPitch, oParts.size(), oArea);
     for (std::size_t nAt = 0; nAt < oParts.size(); ++nAt)
-        codec::PlaceChannel(oParts[nAt].mpFirst, oParts[nAt].mnPitch, pTarget, nPitch, nAt, oParts.size(), oArea);
+        raster::PlaceChannel(oParts[nAt].mpFirst, oParts[nAt].mnPitch, pTarget, nPitch, nAt, oParts.size(), oArea);
 }
 
 // One channel of pixels of several channels into one channel of other pixels.
 void BlockImage::CopyChannel(const unsigned char* pSource, std::size_t nSourcePitch, std::size_t nSourceChannel,
                              std::size_t nSourceChannels, unsigned char* pTarget, std::size_t nTargetPitch,
-                             std::size_t nTargetChannel, std::size_t nTargetChannels, const codec::PixelArea& oArea)
+                             std::size_t nTargetChannel, std::size_t nTargetChannels, const raster::PixelArea& oArea)
 {
     if (nSourceChannels == 1)
-        return codec::PlaceChannel(pSource, nSourcePitch, pTarget, nTargetPitch, nTargetChannel, nTargetChannels,
-                                   oArea);
+        return raster::PlaceChannel(pSource, nSourcePitch, pTarget, nTargetPitch, nTargetChannel, nTargetChannels,
+                                    oArea);
     const std::size_t nPitch = oArea.mnWidth * oArea.mnSampleBytes;
     unsigned char* pPlane = moChannelScratch.Get(nPitch * oArea.mnRows);
-    codec::ExtractChannel(pSource, nSourcePitch, nSourceChannel, nSourceChannels, pPlane, nPitch, oArea);
-    codec::PlaceChannel(pPlane, nPitch, pTarget, nTargetPitch, nTargetChannel, nTargetChannels, oArea);
+    raster::ExtractChannel(pSource, nSourcePitch, nSourceChannel, nSourceChannels, pPlane, nPitch, oArea);
+    raster::PlaceChannel(pPlane, nPitch, pTarget, nTargetPitch, nTargetChannel, nTargetChannels, oArea);
 }
 
 void BlockImage::Write(const ChannelSelection& oChannels, const PixelRect& oRect, const unsigned char* pSource,
@@ -454,17 +446,17 @@ void BlockImage::WritePart(const ChannelSelection& oChannels, const PixelRect& o
     {
         const Pixels oOld = ObtainPart(oBlock, oPart, mbParts ? Keep::eNothing : Keep::eBlock, moScratch);
         if (oOld.mpFirst != pPlane)
-            CopyRows(oOld.mpFirst, oOld.mnPitch, pPlane, nPlanePitch, nPlanePitch, oPart.mnHeight);
+            raster::CopyRows(oOld.mpFirst, oOld.mnPitch, pPlane, nPlanePitch, nPlanePitch, oPart.mnHeight);
         GetCache().Drop({this, oBlock.mnPlane, moLayout.GetBlockIndex(oBlock.mnColumn, oBlock.mnRow)});
     }
-    const codec::PixelArea oArea{oPart.mnWidth, oPart.mnHeight, oChannels.GetValueBytes()};
+    const raster::PixelArea oArea{oPart.mnWidth, oPart.mnHeight, oChannels.GetValueBytes()};
     for (std::size_t nAt = 0; nAt < oChannels.GetCount(); ++nAt)
     {
         const ChannelPlace& oPlace = oChannels.GetPlaces()[nAt];
         if (oPlace.mnPlane != oBlock.mnPlane)
             continue;
         if (nPlaneChannels == 1)
-            codec::ExtractChannel(pSource, nPitch, nAt, oChannels.GetCount(), pPlane, nPlanePitch, oArea);
+            raster::ExtractChannel(pSource, nPitch, nAt, oChannels.GetCount(), pPlane, nPlanePitch, oArea);
         else
             CopyChannel(pSource, nPitch, nAt, oChannels.GetCount(), pPlane, nPlanePitch, oPlace.mnPosition,
                         nPlaneChannels, oArea);

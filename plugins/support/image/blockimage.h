@@ -1,10 +1,10 @@
 #pragma once
 
-#include "plugins/support/codec/interleave.h"
 #include "plugins/support/file/scratch.h"
 #include "plugins/support/image/blockcache.h"
 #include "plugins/support/image/iblocksource.h"
 #include "toolkit/exceptions/place.h"
+#include "toolkit/raster/interleave.h"
 
 #include <cstddef>
 #include <memory>
@@ -90,10 +90,10 @@ private:
     void ReadPlanes(const Job& oJob, const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
                     unsigned char* pTarget);
     static void InterleaveParts(const std::vector<Pixels>& oParts, unsigned char* pTarget, std::size_t nPitch,
-                                const codec::PixelArea& oArea);
+                                const raster::PixelArea& oArea);
     void CopyChannel(const unsigned char* pSource, std::size_t nSourcePitch, std::size_t nSourceChannel,
                      std::size_t nSourceChannels, unsigned char* pTarget, std::size_t nTargetPitch,
-                     std::size_t nTargetChannel, std::size_t nTargetChannels, const codec::PixelArea& oArea);
+                     std::size_t nTargetChannel, std::size_t nTargetChannels, const raster::PixelArea& oArea);
     void WritePart(const ChannelSelection& oChannels, const PixelRect& oRect, const BlockAddress& oBlock,
                    const unsigned char* pSource, std::size_t nPitch);
     void ReserveRowCache(const Job& oJob);

@@ -1,7 +1,7 @@
 #include "plugins/support/image/stackedio.h"
 
-#include "plugins/support/codec/interleave.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/raster/interleave.h"
 
 #include <algorithm>
 
@@ -66,8 +66,8 @@ void StackedIO::ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::
                  [&](std::size_t nAt, const PixelRect& oSlice, unsigned char* pPlane, std::size_t nPlanePitch)
                  {
                      moParts[nAt]->ReadWindow(oSlice.mnX, oSlice.mnY, oSlice.mnWidth, oSlice.mnHeight, pPlane);
-                     codec::PlaceChannel(pPlane, nPlanePitch, pTarget + (oSlice.mnY - oRect.mnY) * nPitch, nPitch, nAt,
-                                         moParts.size(), {oSlice.mnWidth, oSlice.mnHeight, mnValueBytes});
+                     raster::PlaceChannel(pPlane, nPlanePitch, pTarget + (oSlice.mnY - oRect.mnY) * nPitch, nPitch, nAt,
+                                          moParts.size(), {oSlice.mnWidth, oSlice.mnHeight, mnValueBytes});
                  });
 }
 
@@ -80,8 +80,8 @@ void StackedIO::WritePixels(const PixelRect& oRect, const unsigned char* pSource
     ForEachSlice(oRect,
                  [&](std::size_t nAt, const PixelRect& oSlice, unsigned char* pPlane, std::size_t nPlanePitch)
                  {
-                     codec::ExtractChannel(pSource + (oSlice.mnY - oRect.mnY) * nPitch, nPitch, nAt, moParts.size(),
-                                           pPlane, nPlanePitch, {oSlice.mnWidth, oSlice.mnHeight, mnValueBytes});
+                     raster::ExtractChannel(pSource + (oSlice.mnY - oRect.mnY) * nPitch, nPitch, nAt, moParts.size(),
+                                            pPlane, nPlanePitch, {oSlice.mnWidth, oSlice.mnHeight, mnValueBytes});
                      moParts[nAt]->WriteWindow(oSlice.mnX, oSlice.mnY, oSlice.mnWidth, oSlice.mnHeight, pPlane);
                  });
 }

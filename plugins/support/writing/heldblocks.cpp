@@ -1,6 +1,6 @@
 #include "plugins/support/writing/heldblocks.h"
 
-#include "plugins/support/codec/interleave.h"
+#include "toolkit/raster/interleave.h"
 
 #include <algorithm>
 #include <utility>
@@ -28,10 +28,10 @@ void HeldBlocks::Write(const Block& oBlock, const PixelRect& oPart, const unsign
                        const ReadBlock& oRead)
 {
     const std::size_t nHeldPitch = GetPitch(oBlock);
-    codec::CopyRows(pSource, nPitch,
-                    Hold(oBlock, oRead).moPixels.data() + (oPart.mnY - oBlock.moRect.mnY) * nHeldPitch +
-                        (oPart.mnX - oBlock.moRect.mnX) * mnPixelBytes,
-                    nHeldPitch, oPart.mnWidth * mnPixelBytes, oPart.mnHeight);
+    raster::CopyRows(pSource, nPitch,
+                     Hold(oBlock, oRead).moPixels.data() + (oPart.mnY - oBlock.moRect.mnY) * nHeldPitch +
+                         (oPart.mnX - oBlock.moRect.mnX) * mnPixelBytes,
+                     nHeldPitch, oPart.mnWidth * mnPixelBytes, oPart.mnHeight);
 }
 
 void HeldBlocks::Overlay(std::uint64_t nBlock, const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) const
@@ -42,10 +42,11 @@ void HeldBlocks::Overlay(std::uint64_t nBlock, const PixelRect& oRect, unsigned 
     const PixelRect& oHeld = oFound->second->moBlock.moRect;
     const PixelRect oShared = Intersect(oRect, oHeld);
     const std::size_t nHeldPitch = GetPitch(oFound->second->moBlock);
-    codec::CopyRows(oFound->second->moPixels.data() + (oShared.mnY - oHeld.mnY) * nHeldPitch +
-                        (oShared.mnX - oHeld.mnX) * mnPixelBytes,
-                    nHeldPitch, pTarget + (oShared.mnY - oRect.mnY) * nPitch + (oShared.mnX - oRect.mnX) * mnPixelBytes,
-                    nPitch, oShared.mnWidth * mnPixelBytes, oShared.mnHeight);
+    raster::CopyRows(oFound->second->moPixels.data() + (oShared.mnY - oHeld.mnY) * nHeldPitch +
+                         (oShared.mnX - oHeld.mnX) * mnPixelBytes,
+                     nHeldPitch,
+                     pTarget + (oShared.mnY - oRect.mnY) * nPitch + (oShared.mnX - oRect.mnX) * mnPixelBytes, nPitch,
+                     oShared.mnWidth * mnPixelBytes, oShared.mnHeight);
 }
 
 HeldBlocks::Held& HeldBlocks::Hold(const Block& oBlock, const ReadBlock& oRead)

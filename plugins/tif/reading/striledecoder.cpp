@@ -3,6 +3,7 @@
 #include "plugins/support/codec/bits.h"
 #include "plugins/tif/reading/compression.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/raster/interleave.h"
 
 #include <bit>
 #include <cstring>
@@ -15,14 +16,6 @@ namespace
 
 constexpr std::size_t KEPT_SCRATCH_BYTES = std::size_t{4} << 20;
 constexpr bool BIG_ENDIAN_MACHINE = std::endian::native == std::endian::big;
-
-void CopyRows(const unsigned char* pSource, std::size_t nSourcePitch, const WantedPixels& oWanted, std::size_t nBytes)
-{
-    if (pSource == oWanted.mpTarget)
-        return;
-    for (std::uint32_t nRow = 0; nRow < oWanted.mnRows; ++nRow)
-        std::memcpy(oWanted.mpTarget + nRow * oWanted.mnPitch, pSource + nRow * nSourcePitch, nBytes);
-}
 
 } // namespace
 
@@ -169,8 +162,11 @@ void StrileDecoder::Finish(unsigned char* pStored, std::size_t nStoredPitch, boo
     const bool bTurn = oSample.mnPartBits % 8 == 0 && nPartBytes > 1 && bSwapped;
     if (oSample.meWidening == Widening::eNone)
     {
+        if (!bTurn && pStored == oWanted.mpTarget)
+            return;
         if (!bTurn)
-            return CopyRows(pStored, nStoredPitch, oWanted, nSamples * oSample.GetValueBytes());
+            return raster::CopyRows(pStored, nStoredPitch, oWanted.mpTarget, oWanted.mnPitch,
+                                    nSamples * oSample.GetValueBytes(), oWanted.mnRows);
         for (std::uint32_t nRow = 0; nRow < oWanted.mnRows; ++nRow)
             codec::SwapBytes(pStored + nRow * nStoredPitch, oWanted.mpTarget + nRow * oWanted.mnPitch,
                              nSamples * oSample.mnParts, nPartBytes);

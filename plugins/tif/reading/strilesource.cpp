@@ -1,6 +1,7 @@
 #include "plugins/tif/reading/strilesource.h"
 
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/raster/interleave.h"
 
 #include <algorithm>
 #include <cstring>
@@ -266,10 +267,8 @@ void StrileSource::ReadCoded(const Piece& oPiece, const Strile& oStrile)
         const std::size_t nPitch = moForm.GetRowBytes(moForm.mnWidth);
         std::vector<unsigned char> oRows(nPitch * (oPiece.mnY + oWanted.mnRows));
         Decode({moForm.mnWidth, oPiece.mnY + oWanted.mnRows, oRows.data(), nPitch});
-        for (std::uint32_t nRow = 0; nRow < oWanted.mnRows; ++nRow)
-            std::memcpy(oWanted.mpTarget + nRow * oWanted.mnPitch,
-                        oRows.data() + (oPiece.mnY + nRow) * nPitch + moForm.GetRowBytes(oPiece.mnX),
-                        moForm.GetRowBytes(oWanted.mnWidth));
+        raster::CopyRows(oRows.data() + oPiece.mnY * nPitch + moForm.GetRowBytes(oPiece.mnX), nPitch, oWanted.mpTarget,
+                         oWanted.mnPitch, moForm.GetRowBytes(oWanted.mnWidth), oWanted.mnRows);
     }
     moDecoder.Relax();
 }

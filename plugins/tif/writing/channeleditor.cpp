@@ -1,8 +1,8 @@
 #include "plugins/tif/writing/channeleditor.h"
 
-#include "plugins/support/codec/interleave.h"
 #include "plugins/tif/writing/pagewriter.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/raster/interleave.h"
 
 #include <algorithm>
 #include <numeric>
@@ -162,14 +162,15 @@ void ChannelEditor::FillBlock(support::BlockImage& oOld, const support::PixelRec
     std::vector<unsigned char> oOldPixels(nKeptPitch * oRect.mnHeight);
     std::vector<unsigned char> oPlane(nPlanePitch * oRect.mnHeight);
     oOld.Read(oSelection, oRect, oOldPixels.data(), nKeptPitch);
-    const codec::PixelArea oArea{oRect.mnWidth, oRect.mnHeight, nValueBytes};
+    const raster::PixelArea oArea{oRect.mnWidth, oRect.mnHeight, nValueBytes};
     std::size_t nTaken = 0;
     for (std::size_t nChannel = 0; nChannel < moSources.size(); ++nChannel)
     {
         if (moSources[nChannel] == 0)
             continue;
-        codec::ExtractChannel(oOldPixels.data(), nKeptPitch, nTaken++, oKept.size(), oPlane.data(), nPlanePitch, oArea);
-        codec::PlaceChannel(oPlane.data(), nPlanePitch, oPixels.data(), nPitch, nChannel, moSources.size(), oArea);
+        raster::ExtractChannel(oOldPixels.data(), nKeptPitch, nTaken++, oKept.size(), oPlane.data(), nPlanePitch,
+                               oArea);
+        raster::PlaceChannel(oPlane.data(), nPlanePitch, oPixels.data(), nPitch, nChannel, moSources.size(), oArea);
     }
 }
 

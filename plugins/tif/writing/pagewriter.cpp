@@ -1,6 +1,7 @@
 #include "plugins/tif/writing/pagewriter.h"
 
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/raster/interleave.h"
 
 #include <algorithm>
 #include <utility>

@@ -1,11 +1,11 @@
 #include "plugins/tif/writing/strileencoder.h"
 
 #include "plugins/support/codec/bits.h"
-#include "plugins/support/codec/interleave.h"
 #include "plugins/support/codec/predictor.h"
 #include "plugins/tif/reading/compression.h"
 #include "plugins/tif/writing/librarycodec.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/raster/interleave.h"
 
 #include <algorithm>
 #include <bit>
@@ -180,7 +180,7 @@ StrileEncoder::Rows StrileEncoder::Order(const Rows& oRows, std::uint32_t nStore
         return oRows;
     unsigned char* pTarget = moOrdered.Get(nPitch * nStoredRows);
     if (!bTurn)
-        codec::CopyRows(oRows.mpFirst, oRows.mnPitch, pTarget, nPitch, nPitch, nStoredRows);
+        raster::CopyRows(oRows.mpFirst, oRows.mnPitch, pTarget, nPitch, nPitch, nStoredRows);
     for (std::uint32_t nRow = 0; bTurn && nRow < nStoredRows; ++nRow)
         codec::SwapBytes(oRows.mpFirst + nRow * oRows.mnPitch, pTarget + nRow * nPitch, nPitch / nPartBytes,
                          nPartBytes);

@@ -1,5 +1,6 @@
 #include "toolkit/ogc/cs/crsfactory.h"
 
+#include "toolkit/core/lettercase.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/detail/projcrs.h"
 
@@ -73,10 +74,8 @@ bool IsCodeText(std::string_view text, std::string& authority, std::string& code
     {
         return std::isdigit(nByte) != 0;
     };
-    authority = text.substr(0, nColon);
+    authority = ToUpper(text.substr(0, nColon));
     code = text.substr(nColon + 1);
-    std::transform(authority.begin(), authority.end(), authority.begin(),
-                   [](unsigned char nByte) { return static_cast<char>(std::toupper(nByte)); });
     return std::all_of(authority.begin(), authority.end(), IsName) && std::all_of(code.begin(), code.end(), IsDigit);
 }
 

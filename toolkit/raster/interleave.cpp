@@ -1,20 +1,20 @@
-#include "plugins/support/codec/interleave.h"
+#include "toolkit/raster/interleave.h"
 
-#include "plugins/support/codec/detail/memoryaccess.h"
-#include "plugins/support/codec/detail/shuffleplan.h"
-#include "plugins/support/codec/detail/vector16.h"
+#include "toolkit/raster/detail/shuffleplan.h"
+#include "toolkit/simd/memoryaccess.h"
+#include "toolkit/simd/vector16.h"
 
 #include <algorithm>
 #include <type_traits>
 
-namespace krv::plugins::codec
+namespace krv::raster
 {
 
 namespace
 {
 
-using detail::Load;
-using detail::Store;
+using simd::Load;
+using simd::Store;
 
 constexpr std::size_t PIECE_BYTES = 8192; // of the destination, a quarter of the first-level cache
 
@@ -46,12 +46,15 @@ void WithSampleType(std::size_t nSampleBytes, const Work& oWork)
 
 constexpr std::size_t COPY_BYTES = 1024;
 
-// Longer copies are done by the processor's own string instruction, which is ten times slower and worse when the
-// destination lies up to a cache line behind the source within a page.
+// Longer copies are done by the processor's own string instruction, which is ten times slower and worse on some when
+// the destination lies up to a cache line behind the source within a page.
 void CopyRow(const unsigned char* source, unsigned char* destination, std::size_t nBytes)
 {
-    for (; nBytes > COPY_BYTES; nBytes -= COPY_BYTES, source += COPY_BYTES, destination += COPY_BYTES)
-        std::memcpy(destination, source, COPY_BYTES);
+    const auto nBehind =
+        (reinterpret_cast<std::uintptr_t>(destination) - reinterpret_cast<std::uintptr_t>(source)) % 4096;
+    if (nBehind > 0 && nBehind < 64)
+        for (; nBytes > COPY_BYTES; nBytes -= COPY_BYTES, source += COPY_BYTES, destination += COPY_BYTES)
+            std::memcpy(destination, source, COPY_BYTES);
     std::memcpy(destination, source, nBytes);
 }
 
@@ -63,9 +66,9 @@ std::size_t SpreadWords(const unsigned char* plane, unsigned char* destination, 
     std::size_t x = 0;
     for (; x + SAMPLES <= nWidth; x += SAMPLES)
     {
-        const auto nWord = detail::LoadLittleEndian<std::uint64_t>(plane + x * sizeof(T));
+        const auto nWord = simd::LoadLittleEndian<std::uint64_t>(plane + x * sizeof(T));
         for (std::size_t k = 0; k < SAMPLES; ++k)
-            detail::StoreLittleEndian(destination + (x + k) * nTo, static_cast<T>(nWord >> (k * 8 * sizeof(T))));
+            simd::StoreLittleEndian(destination + (x + k) * nTo, static_cast<T>(nWord >> (k * 8 * sizeof(T))));
     }
     return x;
 }
@@ -119,12 +122,12 @@ void GatherRows(const unsigned char* source, std::size_t nSourcePitch, std::size
     }
 }
 
-#if defined(KRV_CODEC_VECTORS)
-using detail::LoadVector;
-using detail::MixHigh;
-using detail::MixLow;
-using detail::StoreVector;
-using detail::Vector;
+#if defined(KRV_VECTOR16)
+using simd::LoadVector;
+using simd::MixHigh;
+using simd::MixLow;
+using simd::StoreVector;
+using simd::Vector;
 
 template <std::size_t nBytes>
 using Unsigned =
@@ -161,7 +164,7 @@ void MixTwo(const unsigned char* const* planes, std::size_t nOffset, unsigned ch
 
 // What plane nPlane gives to vector nVector of three-channel pixels.
 template <typename T, std::size_t nVector, std::size_t nPlane>
-inline constexpr detail::Shuffle THIRD = detail::Shuffle::Make(
+inline constexpr simd::Shuffle THIRD = simd::Shuffle::Make(
     [](std::size_t i)
     {
         const std::size_t nSample = (nVector * 16 + i) / sizeof(T);
@@ -359,4 +362,4 @@ void InterleavePlanes(const unsigned char* const* planes, std::size_t nPlanePitc
                    });
 }
 
-} // namespace krv::plugins::codec
+} // namespace krv::raster

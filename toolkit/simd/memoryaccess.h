@@ -5,7 +5,7 @@
 #include <cstdint>
 #include <cstring>
 
-namespace krv::plugins::codec::detail
+namespace krv::simd
 {
 
 // Words from and to memory of any alignment.
@@ -75,4 +75,4 @@ inline void Copy16(unsigned char* destination, const unsigned char* source)
     std::memcpy(destination, aBytes, 16);
 }
 
-} // namespace krv::plugins::codec::detail
+} // namespace krv::simd

@@ -5,11 +5,11 @@
 
 // Defined where sixteen bytes can be worked on at once; without it the plain loops do the same work.
 #if defined(__SSE4_1__)
-#define KRV_CODEC_VECTORS 1
+#define KRV_VECTOR16 1
 
 #include <smmintrin.h>
 
-namespace krv::plugins::codec::detail
+namespace krv::simd
 {
 
 using Vector = __m128i;
@@ -108,5 +108,5 @@ inline Vector SwapVector(Vector oValue)
     return SWAP<T>(oValue);
 }
 
-} // namespace krv::plugins::codec::detail
+} // namespace krv::simd
 #endif

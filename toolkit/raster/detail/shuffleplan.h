@@ -3,7 +3,7 @@
 #include <array>
 #include <cstddef>
 
-namespace krv::plugins::codec::detail
+namespace krv::raster::detail
 {
 
 // Picks channels out of pixels by byte shuffles of whole vectors of 16 bytes: worked out once, then run along rows.
@@ -49,4 +49,4 @@ private:
     bool mbUsable; // last: the plan is built as it is initialised
 };
 
-} // namespace krv::plugins::codec::detail
+} // namespace krv::raster::detail
