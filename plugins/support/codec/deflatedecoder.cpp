@@ -10,16 +10,6 @@
 namespace krv::plugins::codec
 {
 
-struct DeflateDecoder::State
-{
-    libdeflate_decompressor* mpoDecompressor = libdeflate_alloc_decompressor();
-
-    State() = default;
-    State(const State&) = delete;
-    State& operator=(const State&) = delete;
-    ~State() { libdeflate_free_decompressor(mpoDecompressor); }
-};
-
 namespace
 {
 
@@ -94,21 +84,21 @@ Result Inflate(const unsigned char* input, std::size_t nInput, unsigned char* ou
 
 } // namespace
 
-DeflateDecoder::DeflateDecoder() = default;
-DeflateDecoder::~DeflateDecoder() = default;
-DeflateDecoder::DeflateDecoder(DeflateDecoder&&) noexcept = default;
-DeflateDecoder& DeflateDecoder::operator=(DeflateDecoder&&) noexcept = default;
+void DeflateDecoder::Free::operator()(libdeflate_decompressor* poDecompressor) const
+{
+    libdeflate_free_decompressor(poDecompressor);
+}
 
 Result DeflateDecoder::Decode(const unsigned char* input, std::size_t nInput, unsigned char* output,
                               std::size_t nOutput)
 {
-    if (!mpoState)
-        mpoState = std::make_unique<State>();
-    if (mpoState->mpoDecompressor != nullptr)
+    if (!mpoDecompressor)
+        mpoDecompressor.reset(libdeflate_alloc_decompressor());
+    if (mpoDecompressor)
     {
         std::size_t nBytes = 0;
         const libdeflate_result oResult =
-            libdeflate_zlib_decompress(mpoState->mpoDecompressor, input, nInput, output, nOutput, &nBytes);
+            libdeflate_zlib_decompress(mpoDecompressor.get(), input, nInput, output, nOutput, &nBytes);
         if (oResult == LIBDEFLATE_SUCCESS)
             return {nBytes == nOutput ? Status::eDone : Status::eTruncated, nBytes};
     }

@@ -3,6 +3,8 @@
 #include <cstddef>
 #include <memory>
 
+struct libdeflate_compressor;
+
 namespace krv::plugins::codec
 {
 
@@ -15,9 +17,6 @@ public:
 
     // nLevel: 1 (fast) to 12 (small). Throws std::bad_alloc.
     explicit DeflateEncoder(int nLevel = DEFAULT_LEVEL);
-    ~DeflateEncoder();
-    DeflateEncoder(DeflateEncoder&&) noexcept;
-    DeflateEncoder& operator=(DeflateEncoder&&) noexcept;
 
     // Room that the code of nInput bytes takes at most.
     std::size_t GetBound(std::size_t nInput) const;
@@ -26,8 +25,11 @@ public:
     std::size_t Encode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput);
 
 private:
-    struct State;
-    std::unique_ptr<State> mpoState;
+    struct Free
+    {
+        void operator()(libdeflate_compressor* poCompressor) const;
+    };
+    std::unique_ptr<libdeflate_compressor, Free> mpoCompressor;
 };
 
 } // namespace krv::plugins::codec

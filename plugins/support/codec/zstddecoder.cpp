@@ -8,16 +8,6 @@
 namespace krv::plugins::codec
 {
 
-struct ZstdDecoder::State
-{
-    ZSTD_DCtx* mpoContext = ZSTD_createDCtx();
-
-    State() = default;
-    State(const State&) = delete;
-    State& operator=(const State&) = delete;
-    ~State() { ZSTD_freeDCtx(mpoContext); }
-};
-
 namespace
 {
 
@@ -58,16 +48,16 @@ Result DecodeStream(ZSTD_DCtx* context, const unsigned char* input, std::size_t 
 
 } // namespace
 
-ZstdDecoder::ZstdDecoder() = default;
-ZstdDecoder::~ZstdDecoder() = default;
-ZstdDecoder::ZstdDecoder(ZstdDecoder&&) noexcept = default;
-ZstdDecoder& ZstdDecoder::operator=(ZstdDecoder&&) noexcept = default;
+void ZstdDecoder::Free::operator()(ZSTD_DCtx_s* poContext) const
+{
+    ZSTD_freeDCtx(poContext);
+}
 
 Result ZstdDecoder::Decode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput)
 {
-    if (!mpoState)
-        mpoState = std::make_unique<State>();
-    ZSTD_DCtx* context = mpoState->mpoContext;
+    if (!mpoContext)
+        mpoContext.reset(ZSTD_createDCtx());
+    ZSTD_DCtx* const context = mpoContext.get();
     if (context == nullptr)
         return {Status::eNoMemory, 0};
     const std::size_t nFrame = ZSTD_findFrameCompressedSize(input, nInput);

@@ -3,6 +3,8 @@
 #include <cstddef>
 #include <memory>
 
+struct ZSTD_CCtx_s;
+
 namespace krv::plugins::codec
 {
 
@@ -15,9 +17,6 @@ public:
 
     // nLevel: 1 (fast) to 22 (small). Throws std::bad_alloc.
     explicit ZstdEncoder(int nLevel = DEFAULT_LEVEL);
-    ~ZstdEncoder();
-    ZstdEncoder(ZstdEncoder&&) noexcept;
-    ZstdEncoder& operator=(ZstdEncoder&&) noexcept;
 
     // Room that the code of nInput bytes takes at most.
     std::size_t GetBound(std::size_t nInput) const;
@@ -26,8 +25,11 @@ public:
     std::size_t Encode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput);
 
 private:
-    struct State;
-    std::unique_ptr<State> mpoState;
+    struct Free
+    {
+        void operator()(ZSTD_CCtx_s* poContext) const;
+    };
+    std::unique_ptr<ZSTD_CCtx_s, Free> mpoContext;
 };
 
 } // namespace krv::plugins::codec
