@@ -1,6 +1,7 @@
 #include "datasources/iomanager/formatcapabilities.h"
 
 #include "datasources/iomanager/xalanselect.h"
+#include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/debugger.h"
 #include "toolkit/xml/xmldocument.h"
@@ -10,7 +11,6 @@
 #include <xalanc/PlatformSupport/XSLException.hpp>
 #include <xalanc/XalanDOM/XalanNode.hpp>
 
-#include <charconv>
 #include <limits>
 
 namespace krv::datasources
@@ -57,12 +57,10 @@ Answer Ask(const std::string& xmlPath, const std::string& xpath, Answer oOtherwi
 
 unsigned long long ParseLimit(const std::string& text)
 {
-    unsigned long long nLimit = 0;
-    const char* const pEnd = text.data() + text.size();
-    const auto oResult = std::from_chars(text.data(), pEnd, nLimit);
-    if (oResult.ec != std::errc() || oResult.ptr != pEnd)
+    const auto oLimit = krv::ParseNumber<unsigned long long>(text);
+    if (!oLimit)
         throw krv::DataException("The limit is not a number: " + text);
-    return nLimit;
+    return *oLimit;
 }
 
 } // namespace

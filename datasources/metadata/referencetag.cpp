@@ -1,6 +1,7 @@
 #include "datasources/metadata/referencetag.h"
 
-#include <charconv>
+#include "toolkit/core/numbertext.h"
+
 #include <string_view>
 
 namespace krv::datasources
@@ -12,17 +13,15 @@ namespace
 constexpr std::string_view PREFIX = "gdb:";
 
 // One optional sign, then digits alone. A minus gives the two's complement.
-bool ParseNumber(std::string_view text, unsigned int& nNumber)
+bool ParseSigned(std::string_view text, unsigned int& nNumber)
 {
     const bool bNegative = text.starts_with('-');
     if (bNegative || text.starts_with('+'))
         text.remove_prefix(1);
-    unsigned int nValue = 0;
-    const auto [pEnd, eError] = std::from_chars(text.data(), text.data() + text.size(), nValue);
-    if (eError != std::errc() || pEnd != text.data() + text.size())
-        return false;
-    nNumber = bNegative ? 0u - nValue : nValue;
-    return true;
+    const auto oValue = krv::ParseNumber<unsigned int>(text);
+    if (oValue)
+        nNumber = bNegative ? 0u - *oValue : *oValue;
+    return oValue.has_value();
 }
 
 } // namespace
@@ -62,7 +61,7 @@ bool ParseRefMetadataTag(const std::string& tag, std::string& file, std::string&
     if (nColon == std::string_view::npos)
         return false;
     layer = segment.substr(0, nColon);
-    return !layer.empty() && ParseNumber(segment.substr(nColon + 1), nNumber);
+    return !layer.empty() && ParseSigned(segment.substr(nColon + 1), nNumber);
 }
 
 } // namespace krv::datasources

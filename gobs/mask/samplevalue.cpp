@@ -1,6 +1,7 @@
 #include "gobs/mask/samplevalue.h"
 
-#include <charconv>
+#include "toolkit/core/numbertext.h"
+
 #include <cmath>
 
 namespace krv::gobs
@@ -36,8 +37,7 @@ std::string SampleValue::GetText() const
         return std::to_string(GetNegative());
     if (std::isnan(mnReal))
         return "nan";
-    char oText[32];
-    return std::string(oText, std::to_chars(oText, oText + sizeof oText, mnReal).ptr);
+    return NumberText(mnReal);
 }
 
 } // namespace krv::gobs

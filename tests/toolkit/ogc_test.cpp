@@ -215,7 +215,7 @@ TEST(CRSParts, WhatWasTakenApartIsTheSameSystemWhenPutTogether)
     EXPECT_EQ(oBase.code, 4277);
     oBase.code = oBase.datum.code = 0;
     oBase.shift = {446, -125, 542};
-    const auto poBound = CreateGeographicCRS(oBase);
+    const auto poBound = CreateGeodeticCRS(oBase);
     EXPECT_TRUE(poBound->IsGeographic());
     EXPECT_EQ(poBound->GetEllipsoidName(), "Airy 1830");
     EXPECT_EQ(DescribeCRS(*poBound).horizontal.base.shift, oBase.shift);

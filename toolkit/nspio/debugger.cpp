@@ -1,8 +1,9 @@
 #include "toolkit/nspio/debugger.h"
 
+#include "toolkit/nspio/detail/sinkholder.h"
+
 #include <atomic>
 #include <cstdio>
-#include <mutex>
 #include <utility>
 
 namespace krv::nspio
@@ -12,19 +13,6 @@ namespace
 {
 
 constinit std::atomic<int> snLevel{0};
-
-// Made on first use and never destroyed: messages may still come while the process ends.
-struct State
-{
-    std::mutex moMutex; // guards moSink
-    Debugger::Sink moSink;
-};
-
-State& GetState()
-{
-    static State* const poState = new State;
-    return *poState;
-}
 
 } // namespace
 
@@ -43,11 +31,7 @@ void Debugger::Debug(int nLevel, const std::string& module, const std::string& m
 {
     if (nLevel > GetLevel())
         return;
-    Sink oSink;
-    {
-        const std::lock_guard oLock(GetState().moMutex);
-        oSink = GetState().moSink;
-    }
+    const Sink oSink = detail::SinkHolder<Debugger>::Get();
     if (oSink)
         oSink(nLevel, module, message, sourceFile, nLine);
     else
@@ -57,8 +41,7 @@ void Debugger::Debug(int nLevel, const std::string& module, const std::string& m
 
 Debugger::Sink Debugger::SetSink(Sink oSink)
 {
-    const std::lock_guard oLock(GetState().moMutex);
-    return std::exchange(GetState().moSink, std::move(oSink));
+    return detail::SinkHolder<Debugger>::Set(std::move(oSink));
 }
 
 } // namespace krv::nspio

@@ -1,37 +1,16 @@
 #include "toolkit/nspio/warning.h"
 
+#include "toolkit/nspio/detail/sinkholder.h"
+
 #include <cstdio>
-#include <mutex>
 #include <utility>
 
 namespace krv::nspio
 {
 
-namespace
-{
-
-// Made on first use and never destroyed: warnings may still come while the process ends.
-struct State
-{
-    std::mutex moMutex; // guards moSink
-    Warning::Sink moSink;
-};
-
-State& GetState()
-{
-    static State* const poState = new State;
-    return *poState;
-}
-
-} // namespace
-
 void Warning::Warn(const std::string& message, const std::string& sourceFile, unsigned int nLine)
 {
-    Sink oSink;
-    {
-        const std::lock_guard oLock(GetState().moMutex);
-        oSink = GetState().moSink;
-    }
+    const Sink oSink = detail::SinkHolder<Warning>::Get();
     if (oSink)
         oSink(message, sourceFile, nLine);
     else
@@ -40,8 +19,7 @@ void Warning::Warn(const std::string& message, const std::string& sourceFile, un
 
 Warning::Sink Warning::SetSink(Sink oSink)
 {
-    const std::lock_guard oLock(GetState().moMutex);
-    return std::exchange(GetState().moSink, std::move(oSink));
+    return detail::SinkHolder<Warning>::Set(std::move(oSink));
 }
 
 } // namespace krv::nspio

@@ -105,17 +105,11 @@ int CRSBuilder::FindStatedModel() const
 
 CRSBuilder::CRS CRSBuilder::BuildFromKeys() const
 {
-    switch (FindStatedModel())
-    {
-    case ModelTypeProjected:
+    const int nModel = FindStatedModel();
+    if (nModel == ModelTypeProjected)
         return BuildProjected();
-    case ModelTypeGeographic:
-        return CreateGeographicCRS(Base(), moPlace);
-    case ModelTypeGeocentric:
-        return CreateGeocentricCRS(Base(), moPlace);
-    default:
-        return moKeys.FindCode(GeographicTypeGeoKey) != 0 ? CreateGeographicCRS(Base(), moPlace) : nullptr;
-    }
+    const bool bNamed = nModel != 0 || moKeys.FindCode(GeographicTypeGeoKey) != 0;
+    return bNamed ? CreateGeodeticCRS(Base(), moPlace) : nullptr;
 }
 
 // Some writers put the whole definition as text into a citation when the keys cannot say it.
@@ -291,6 +285,7 @@ GeodeticParts CRSBuilder::Base() const
         return oParts;
     }
     oParts.name = NamedPart(GeogCitationGeoKey, "GCS Name");
+    oParts.geocentric = FindStatedModel() == ModelTypeGeocentric;
     oParts.length = Unit(GeogLinearUnitsGeoKey, GeogLinearUnitSizeGeoKey);
     DatumParts& oDatum = oParts.datum;
     oDatum.code = moKeys.FindCode(GeogGeodeticDatumGeoKey);

@@ -20,8 +20,8 @@ constexpr std::uint16_t TAG_KEYS = 34735;
 constexpr std::uint16_t TAG_DOUBLES = 34736;
 constexpr std::uint16_t TAG_TEXTS = 34737;
 constexpr std::uint16_t VERSION = 1;
-constexpr std::size_t ENTRY_VALUES =
-    4; // of a key: itself, the tag of its values or 0, their number, their place or the value
+// Of a key: itself, the tag of its values or 0, their number, their place or the value.
+constexpr std::size_t ENTRY_VALUES = 4;
 // Texts are stored one behind the other, each with this at its end.
 constexpr char TEXT_END = '|';
 
@@ -33,13 +33,6 @@ std::vector<double> GetDoubles(const TagList& oTags)
          nAt += 8)
         oDoubles.push_back(std::bit_cast<double>(ReadNumber(pTag->moBytes.data() + nAt, 8, oTags.IsBigEndian())));
     return oDoubles;
-}
-
-std::string WithoutEnd(std::string text)
-{
-    if (text.ends_with(TEXT_END))
-        text.pop_back();
-    return text;
 }
 
 } // namespace
@@ -101,7 +94,10 @@ GeoKeyList GeoKeyList::Parse(const std::vector<std::uint16_t>& oShorts, const st
             break;
         case TAG_TEXTS:
             if (nCount > 0 && nValue < texts.size())
-                oList.Set(nKey, WithoutEnd(texts.substr(nValue, nCount)));
+            {
+                const std::string text = texts.substr(nValue, nCount);
+                oList.Set(nKey, text.substr(0, text.size() - (text.ends_with(TEXT_END) ? 1 : 0)));
+            }
             break;
         default:
             break;

@@ -74,25 +74,19 @@ void ReadResolution(TIFF* poTiff, AuxiliaryData& oData)
 
 const char* PhotometricText(std::uint16_t nPhotometric)
 {
-    switch (nPhotometric)
-    {
-    case PHOTOMETRIC_MINISWHITE:
-        return "MinIsWhite";
-    case PHOTOMETRIC_MASK:
-        return "Mask";
-    case PHOTOMETRIC_SEPARATED:
-        return "Separated";
-    case PHOTOMETRIC_CIELAB:
-        return "CIELab";
-    case PHOTOMETRIC_ICCLAB:
-        return "ICCLab";
-    case PHOTOMETRIC_ITULAB:
-        return "ITULab";
-    case PHOTOMETRIC_CFA:
-        return "CFA";
-    default:
-        return "";
-    }
+    constexpr std::pair<std::uint16_t, const char*> NAMES[] = {
+        {PHOTOMETRIC_MINISWHITE, "MinIsWhite"},
+        {PHOTOMETRIC_MASK, "Mask"},
+        {PHOTOMETRIC_SEPARATED, "Separated"},
+        {PHOTOMETRIC_CIELAB, "CIELab"},
+        {PHOTOMETRIC_ICCLAB, "ICCLab"},
+        {PHOTOMETRIC_ITULAB, "ITULab"},
+        {PHOTOMETRIC_CFA, "CFA"},
+    };
+    for (const auto& [nNumber, pName] : NAMES)
+        if (nNumber == nPhotometric)
+            return pName;
+    return "";
 }
 
 void ReadGeography(TIFF* poTiff, AuxiliaryData& oData)

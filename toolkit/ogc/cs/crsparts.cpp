@@ -125,7 +125,7 @@ public:
     std::string Angle(const GeodeticParts& oParts) const;
     std::string Length(const UnitParts& oParts) const { return Unit(oParts, false); }
     std::string Datum(const GeodeticParts& oParts) const;
-    std::string Geographic(const GeodeticParts& oParts) const;
+    std::string Geodetic(const GeodeticParts& oParts) const;
     std::string Conversion(const ProjectedParts& oParts) const;
     std::unique_ptr<ICRS> Shifted(std::unique_ptr<ICRS> poSystem, const GeodeticParts& oParts) const;
 
@@ -209,18 +209,23 @@ std::string PartsText::Datum(const GeodeticParts& oParts) const
                    {"prime_meridian", PrimeMeridian(oParts)}});
 }
 
-std::string PartsText::Geographic(const GeodeticParts& oParts) const
+std::string PartsText::Geodetic(const GeodeticParts& oParts) const
 {
     if (oParts.code != 0)
         return Known(eEPSG_CRS, oParts.code);
     if (oParts.system != nullptr)
         return oParts.system->GetPROJJSON();
-    const std::string unit = Angle(oParts);
-    return Object({{"type", "\"GeographicCRS\""},
+    const std::string unit = oParts.geocentric ? Length(oParts.length) : Angle(oParts);
+    const std::string axes = oParts.geocentric
+                                 ? Axes("Cartesian", Axis("Geocentric X", "X", "geocentricX", unit) + "," +
+                                                         Axis("Geocentric Y", "Y", "geocentricY", unit) + "," +
+                                                         Axis("Geocentric Z", "Z", "geocentricZ", unit))
+                                 : Axes("ellipsoidal", Axis("Geodetic latitude", "Lat", "north", unit) + "," +
+                                                           Axis("Geodetic longitude", "Lon", "east", unit));
+    return Object({{"type", oParts.geocentric ? "\"GeodeticCRS\"" : "\"GeographicCRS\""},
                    {"name", Quoted(oParts.name)},
                    {"datum", Datum(oParts)},
-                   {"coordinate_system", Axes("ellipsoidal", Axis("Geodetic latitude", "Lat", "north", unit) + "," +
-                                                                 Axis("Geodetic longitude", "Lon", "east", unit))}});
+                   {"coordinate_system", axes}});
 }
 
 std::string PartsText::Conversion(const ProjectedParts& oParts) const
@@ -252,7 +257,7 @@ std::string PartsText::Conversion(const ProjectedParts& oParts) const
 std::unique_ptr<ICRS> PartsText::Shifted(std::unique_ptr<ICRS> poSystem, const GeodeticParts& oParts) const
 {
     const std::size_t nCount = oParts.shift.size();
-    if (oParts.code != 0 || nCount == 0)
+    if (oParts.code != 0 || oParts.geocentric || nCount == 0)
         return poSystem;
     Expect(nCount == 3 || nCount == FULL_SHIFT, "the shift to WGS 84 has neither three nor seven numbers", "shift");
     for (const double nValue : oParts.shift)
@@ -295,34 +300,18 @@ void DescribeMethod(const ICRS& oCRS, ProjectedParts& oParts)
 
 } // namespace
 
-std::unique_ptr<ICRS> CreateGeographicCRS(const GeodeticParts& oParts, const Place& oPlace)
+std::unique_ptr<ICRS> CreateGeodeticCRS(const GeodeticParts& oParts, const Place& oPlace)
 {
     if (oParts.code != 0)
         return CreateCRSFromEPSG(oParts.code, oPlace);
     const PartsText oText(oPlace);
-    return oText.Shifted(CreateCRSFromWKT(oText.Geographic(oParts), oPlace), oParts);
-}
-
-std::unique_ptr<ICRS> CreateGeocentricCRS(const GeodeticParts& oParts, const Place& oPlace)
-{
-    if (oParts.code != 0)
-        return CreateCRSFromEPSG(oParts.code, oPlace);
-    const PartsText oText(oPlace);
-    const std::string unit = oText.Length(oParts.length);
-    return CreateCRSFromWKT(
-        Object({{"type", "\"GeodeticCRS\""},
-                {"name", Quoted(oParts.name)},
-                {"datum", oText.Datum(oParts)},
-                {"coordinate_system", Axes("Cartesian", Axis("Geocentric X", "X", "geocentricX", unit) + "," +
-                                                            Axis("Geocentric Y", "Y", "geocentricY", unit) + "," +
-                                                            Axis("Geocentric Z", "Z", "geocentricZ", unit))}}),
-        oPlace);
+    return oText.Shifted(CreateCRSFromWKT(oText.Geodetic(oParts), oPlace), oParts);
 }
 
 std::unique_ptr<ICRS> CreateProjectedCRS(const ProjectedParts& oParts, const Place& oPlace)
 {
     const PartsText oText(oPlace);
-    const std::string base = oText.Geographic(oParts.base);
+    const std::string base = oText.Geodetic(oParts.base);
     const std::string conversion = oText.Conversion(oParts);
     const std::string unit = oText.Length(oParts.length);
     const auto Create = [&](const std::string& axes)

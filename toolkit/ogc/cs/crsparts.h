@@ -56,10 +56,11 @@ struct GeodeticParts
     const ICRS* system = nullptr; // borrowed: it itself, in place of all else but the unit
     std::string name = "unknown";
     DatumParts datum;
-    UnitParts angle;  // not given: that of the system with the code, else the degree
-    UnitParts length; // of geocentric axes
-    // To WGS 84 where there is no code, of 3 or 7 numbers, nothing otherwise: metres along X, Y and Z, then arc seconds
-    // about them (position vector) and parts per million.
+    bool geocentric = false; // X, Y and Z in place of latitude and longitude
+    UnitParts angle;         // not given: that of the system with the code, else the degree
+    UnitParts length;        // of geocentric axes
+    // Of a geographic system, to WGS 84 where there is no code, of 3 or 7 numbers, nothing otherwise: metres along X, Y
+    // and Z, then arc seconds about them (position vector) and parts per million.
     std::vector<double> shift;
 };
 
@@ -86,10 +87,8 @@ struct VerticalParts
 // Makers of systems from their parts. They throw krv::ParameterException, which says what is impossible about a value,
 // and krv::DataException like the functions of crsfactory.h.
 
-KRV_TOOLKIT_API std::unique_ptr<ICRS> CreateGeographicCRS(const GeodeticParts& oParts,
-                                                          const Place& oPlace = Place::Current());
-KRV_TOOLKIT_API std::unique_ptr<ICRS> CreateGeocentricCRS(const GeodeticParts& oParts,
-                                                          const Place& oPlace = Place::Current());
+KRV_TOOLKIT_API std::unique_ptr<ICRS> CreateGeodeticCRS(const GeodeticParts& oParts,
+                                                        const Place& oPlace = Place::Current());
 
 // The axes are easting and northing, but those that are usual for views of a pole and for southern grids.
 KRV_TOOLKIT_API std::unique_ptr<ICRS> CreateProjectedCRS(const ProjectedParts& oParts,
