@@ -7,7 +7,6 @@
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/reader/basicreader.h"
-#include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/writer/replacingwriter.h"
 #include "gobs/raster/raster.h"
 #include "gobs/raster/rasterinfo.h"
@@ -182,28 +181,6 @@ TEST_P(FormatConformance, SmallAndThinImagesPassTheChecks)
     }
 }
 
-TEST_P(FormatConformance, EveryTypeAndLayoutGivesTheRecipesPixels)
-{
-    const FormatTraits& oTraits = GetParam();
-    for (const DataType& oType : oTraits.GetTypes())
-    {
-        for (unsigned int nVariant = 0; nVariant < oTraits.moVariants.size(); ++nVariant)
-        {
-            Image oImage;
-            oImage.moTypes.assign(3, oType);
-            oImage.mnVariant = nVariant;
-            SCOPED_TRACE(oType.Describe() + " " + oTraits.moVariants[nVariant]);
-            const std::string file = Make(oImage);
-            BasicReader oReader(file);
-            EXPECT_EQ(oReader.GetFileFormat()->GetShortName(), oTraits.moShortName);
-            EXPECT_EQ(oReader.GetDataType(), oType);
-            EXPECT_TRUE(HoldsRecipe(oReader, {1, 2, 3}));
-            BasicReader oTurned(file, {3, 1, 3});
-            EXPECT_TRUE(HoldsRecipe(oTurned, {3, 1, 3}));
-        }
-    }
-}
-
 TEST_P(FormatConformance, MixedTypesAreReadTypeByType)
 {
     if (!GetParam().mbMixedTypes)
@@ -222,29 +199,6 @@ TEST_P(FormatConformance, MixedTypesAreReadTypeByType)
         EXPECT_TRUE(HoldsRecipe(oReader, {nChannel})) << nChannel;
         const BasicReader oSame(file, DataTypeChannelFilter(oType));
         EXPECT_EQ(oSame.GetChansCount(), oType == DataType(krv::gobs::eDT_8U) ? 16u : 1u) << nChannel;
-    }
-}
-
-TEST_P(FormatConformance, LevelsGiveTheRecipesPixels)
-{
-    if (!GetParam().mbOverviews)
-        GTEST_SKIP() << "the format holds no levels";
-    for (unsigned int nVariant = 0; nVariant < GetParam().moVariants.size(); ++nVariant)
-    {
-        SCOPED_TRACE(GetParam().moVariants[nVariant]);
-        Image oImage;
-        oImage.moTypes.assign(2, krv::gobs::eDT_16U);
-        oImage.moLevels = {2, 4, 8};
-        oImage.mnVariant = nVariant;
-        BasicReader oReader(Make(oImage), {2, 1});
-        const std::unique_ptr<IOverviewReaderAccessor> oAccessor(oReader.GetOverviewReaderAccessor());
-        ASSERT_EQ(oAccessor->GetLevels(), (Channels{2, 4, 8}));
-        for (const unsigned int nLevel : oImage.moLevels)
-        {
-            const std::unique_ptr<IRasterReader> oLevel(oAccessor->CreateRasterReader(nLevel));
-            EXPECT_EQ(oLevel->GetWidth(), (oImage.mnWidth + nLevel - 1) / nLevel);
-            EXPECT_TRUE(HoldsRecipe(*oLevel, {2 + 1000 * nLevel, 1 + 1000 * nLevel}));
-        }
     }
 }
 

@@ -132,16 +132,6 @@ TEST(BlockPoolTest, KeepsNoMoreThanThePeakAndTheLimit)
     EXPECT_LE(oPool->GetKeptBytes(), BlockPool::MOST_KEPT);
 }
 
-// A block that serves a smaller request for want of a better one does not keep out the size that is wanted.
-TEST(BlockPoolTest, LargeEnoughIsNotWanted)
-{
-    TestPool oPool;
-    oPool.Cycle({2 * MIB});
-    for (int i = 0; i < 6; ++i)
-        oPool.Cycle({900 * KIB, 4 * MIB});
-    EXPECT_EQ(oPool->GetKeptBytes(), 900 * KIB + 4 * MIB);
-}
-
 TEST(BlockPoolTest, BlocksThatNobodyWantsMakeRoom)
 {
     TestPool oPool;

@@ -3,7 +3,6 @@
 #include "datasources/interfaces/channelinfo.h"
 #include "tests/support/probe.h"
 #include "tests/support/syntheticdataset.h"
-#include "tests/support/thrown.h"
 
 #include <gtest/gtest.h>
 
@@ -43,26 +42,6 @@ TEST(DataTypeChannelFilter, ComparesAllSixFields)
     {
         EXPECT_EQ(DataTypeChannelFilter(oTypes[nChannel - 1]).Accept(oDataset), Channels{nChannel});
         EXPECT_FALSE(DataTypeChannelFilter(oBase).Accept(oDataset, nChannel)) << nChannel;
-    }
-}
-
-TEST(DataTypeChannelFilter, AsksNoChannelOfAnEmptyDatasetAndLeaksNoDescription)
-{
-    krv::test::Probe oProbe;
-    const DataTypeChannelFilter oFilter(krv::gobs::eDT_16U);
-    const auto oEmpty = Decorate(oProbe, std::make_unique<krv::test::SyntheticDataset>(ModelOf({})));
-    EXPECT_TRUE(oFilter.Accept(dynamic_cast<IRasterDataset&>(*oEmpty)).empty());
-    ASSERT_EQ(oProbe.GetCalls().size(), 1u);
-    EXPECT_NE(oProbe.GetCalls()[0].find("GetChanCount"), std::string::npos);
-
-    const auto oFull = Decorate(oProbe, std::make_unique<krv::test::SyntheticDataset>(
-                                            ModelOf({krv::gobs::eDT_8U, krv::gobs::eDT_16S, krv::gobs::eDT_16U})));
-    auto& oRaster = dynamic_cast<IRasterDataset&>(*oFull);
-    for (unsigned int n = 1, nThrown = 1; nThrown != 0; ++n)
-    {
-        oProbe.Arm(n, krv::test::Fault::eForeign);
-        nThrown = krv::test::Error([&] { EXPECT_EQ(oFilter.Accept(oRaster), Channels{3}); }) == "foreign";
-        EXPECT_EQ(oProbe.GetLive(), 2) << n; // the two datasets
     }
 }
 

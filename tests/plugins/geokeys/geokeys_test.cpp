@@ -126,15 +126,6 @@ TiffFile OpenData(const std::string& file)
     return TiffFile(TIFFOpen((DataFolder() + "/" + file).c_str(), "r"));
 }
 
-std::string Kind(const ICRS* poCRS)
-{
-    if (poCRS == nullptr)
-        return "-";
-    if (poCRS->GetEPSG() != 0)
-        return "EPSG:" + std::to_string(poCRS->GetEPSG());
-    return poCRS->IsProjected() ? "projected" : poCRS->IsGeographic() ? "geographic" : "other";
-}
-
 void ExpectTerms(const GeocodingInfo& oInfo, const std::array<double, 6>& oExpected)
 {
     for (std::size_t nTerm = 0; nTerm < 6; ++nTerm)
@@ -143,23 +134,6 @@ void ExpectTerms(const GeocodingInfo& oInfo, const std::array<double, 6>& oExpec
 }
 
 } // namespace
-
-TEST(GeoKeysOfRealFiles, AgreeWithTheTableOfFacts)
-{
-    if (krv::test::GetFacts().empty())
-        GTEST_SKIP() << "no real files at " << DataFolder();
-    for (const krv::test::Facts& oFacts : krv::test::GetFacts())
-    {
-        SCOPED_TRACE(oFacts["file"]);
-        const TiffFile poFile = OpenData(oFacts["file"]);
-        ASSERT_NE(poFile, nullptr);
-        EXPECT_EQ(ReadTiePoints(poFile.get()).size(), std::strtoul(oFacts["tie_points"].c_str(), nullptr, 10));
-        // Three files say in text what their keys cannot; all of them are projected.
-        const std::string& crs = oFacts["crs"];
-        const std::string expected = crs.starts_with("EPSG") ? crs : crs.substr(0, crs.find(':'));
-        EXPECT_EQ(Kind(ReadCRS(poFile.get()).get()), expected == "model" ? "projected" : expected);
-    }
-}
 
 TEST(GeoKeysOfRealFiles, DefinitionsWithoutCodesAreTheSystemsTheyAreNamedAfter)
 {
