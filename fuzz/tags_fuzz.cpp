@@ -66,7 +66,6 @@ extern "C" int LLVMFuzzerInitialize(int*, char***)
 {
     krv::nspio::Warning::SetSink([](const std::string&, const std::string&, unsigned int) {});
     krv::datasources::DatasetManager::GetInstance();
-    krv::fuzz::ReportSystems();
     return 0;
 }
 

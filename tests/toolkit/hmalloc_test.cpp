@@ -132,20 +132,6 @@ TEST(BlockPoolTest, KeepsNoMoreThanThePeakAndTheLimit)
     EXPECT_LE(oPool->GetKeptBytes(), BlockPool::MOST_KEPT);
 }
 
-TEST(BlockPoolTest, BlocksThatNobodyWantsMakeRoom)
-{
-    TestPool oPool;
-    oPool.Cycle(std::vector<std::size_t>(8, MIB));
-    for (int i = 0; i < 4; ++i)
-        oPool.Cycle(std::vector<std::size_t>(4, 2 * MIB));
-    void* pFirst = oPool->Allocate(2 * MIB);
-    void* pSecond = oPool->Allocate(2 * MIB);
-    void* pThird = oPool->Allocate(2 * MIB);
-    EXPECT_LE(oPool->GetKeptBytes(), 2 * MIB) << "the blocks of the work before went, those of this one stayed";
-    for (void* pBlock : {pFirst, pSecond, pThird})
-        oPool->Free(pBlock);
-}
-
 // Blocks change hands between threads; nobody ever finds another's mark in his own.
 TEST(BlockPoolTest, ThreadsShareThePool)
 {

@@ -97,6 +97,7 @@ TEST(Command, WalkDeliversEveryTileWithItsMargins)
                               "--behaviour", "replicate", "--json"});
     ASSERT_EQ(oRun.code, 0) << oRun.errors;
     EXPECT_EQ(oRun.Json()["tiles"], 6);
+    EXPECT_EQ(oRun.Json()["xMargin"], 8);
     EXPECT_EQ(oRun.Json()["pixels"], 6 * 116 * 158);
     EXPECT_EQ(oRun.Json()["bytes"], 6 * 116 * 158 * 3);
     ExpectFailure(RunKrv({"walk", SceneFolder() + "/rgb.tif", "--margins", "8", "--behaviour", "exception"}), 1,

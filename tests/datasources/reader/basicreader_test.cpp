@@ -194,23 +194,6 @@ TEST_F(BasicReaderTest, ConstructorsCheckTheirArguments)
     EXPECT_EQ(Error([&] { BasicReader(oBare.get(), oAll, false); }), "data: This dataset doesn't support Raster.");
 }
 
-TEST_F(BasicReaderTest, ExceptionsOfConstructorsNameTheirPlace)
-{
-    moModel->moTypes.clear();
-    for (const auto& oMake : std::vector<std::function<void()>>{[this] { BasicReader{moFile}; },
-                                                                [this] { BasicReader(moFile, Channels{}); },
-                                                                [this] { BasicReader(moFile, moFilter); },
-                                                                [this]
-                                                                {
-                                                                    BasicReader(MakeDataset().get(), {}, false);
-                                                                }})
-    {
-        const auto oException = Thrown<krv::DataException>(oMake);
-        ExpectPlace(oException, "BasicReader::BasicReader(", "datasources/reader/basicreader", oException.GetLine());
-        EXPECT_GT(oException.GetLine(), 0u);
-    }
-}
-
 TEST_F(BasicReaderTest, RefusedMarginsKeepTheOldOnesButForTheBehaviour)
 {
     BasicReader oReader(moFile);

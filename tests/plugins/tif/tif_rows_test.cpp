@@ -45,35 +45,4 @@ TEST(TifRows, StripThatIsTooLargeToDecodeAtOnceIsReadRowByRow)
     }
 }
 
-TEST(TifRows, BlocksOfStripsAreSensibleAndNeverTheWholeImage)
-{
-    struct Case
-    {
-        unsigned int width, height, rowsPerStrip;
-        std::uint16_t compression;
-    };
-    for (const Case& oCase : {Case{100, 80, 8, 1}, Case{8192, 8192, 1, 8}, Case{8192, 8192, 8192, 1},
-                              Case{3000, 3000, 3000, 8}, Case{100, 20, 3, 8}})
-    {
-        const TempFolder oFolder;
-        const std::string file = oFolder.File("strips.tif");
-        {
-            const TiffFile poTiff = NewTiff(file);
-            SetForm(poTiff.get(), {.mnWidth = oCase.width,
-                                   .mnHeight = oCase.height,
-                                   .mnCompression = oCase.compression,
-                                   .mnRows = oCase.rowsPerStrip});
-            WriteBlock(poTiff.get(), 0, Bytes(std::size_t{oCase.width} * oCase.rowsPerStrip));
-        }
-        const TifPointer oFile = OpenTif(file);
-        const IOPointer poIO(oFile->GetRasterIO({1}));
-        SCOPED_TRACE(oCase.width);
-        EXPECT_EQ(poIO->GetTileWidth(), oCase.width);
-        EXPECT_LT(poIO->GetTileHeight(), oCase.height);
-        EXPECT_LE(poIO->GetTileHeight(), 512u);
-        EXPECT_LE(std::size_t{poIO->GetTileWidth()} * poIO->GetTileHeight(), std::size_t{4} << 20);
-        EXPECT_TRUE(oCase.rowsPerStrip > 256 || poIO->GetTileHeight() % oCase.rowsPerStrip == 0);
-    }
-}
-
 } // namespace
