@@ -48,7 +48,7 @@ std::uint64_t ReaderBytes(const krv::datasources::IRasterReader& oReader)
 
 // The planes of some channels, in their order, whatever their types.
 std::vector<Plane> ReadPlanes(const SourceFile& oFile, const std::vector<unsigned int>& oChannels, const Size& oSize,
-                              Reduction eReduction, const Progress& oProgress)
+                              Resampling eMethod, const Progress& oProgress)
 {
     const std::vector<ChannelGroup> oGroups = oFile.GroupByType(oChannels);
     std::vector<LevelReader> oReaders;
@@ -65,7 +65,7 @@ std::vector<Plane> ReadPlanes(const SourceFile& oFile, const std::vector<unsigne
         std::vector<OptionalNoData> oNoData;
         for (const unsigned int nChannel : oGroups[g].channels)
             oNoData.push_back(oFile.GetNoData(nChannel));
-        auto oFound = Reduce(oReaders[g].Get(), oNoData, oSize.width, oSize.height, eReduction, oCounter);
+        auto oFound = Reduce(oReaders[g].Get(), oNoData, oSize.width, oSize.height, eMethod, oCounter);
         for (std::size_t i = 0; i < oFound.size(); ++i)
             oPlanes[oGroups[g].positions[i]] = std::move(oFound[i]);
     }
@@ -88,7 +88,7 @@ float FullAlpha(const Plane& oAlpha, float nFull)
 void ApplyAlpha(const SourceFile& oFile, const DisplayChoice& oChoice, const Size& oSize, std::vector<Plane>& oPlanes,
                 std::vector<float>& oOpacity, const Progress& oProgress)
 {
-    const Plane oAlpha = ReadPlanes(oFile, {oChoice.alphaChannel}, oSize, Reduction::eAverage, oProgress).front();
+    const Plane oAlpha = ReadPlanes(oFile, {oChoice.alphaChannel}, oSize, Resampling::eAverage, oProgress).front();
     const float nFull = FullAlpha(oAlpha, oChoice.alphaFull);
     Multiply(oOpacity, oAlpha, nFull);
     for (Plane& oPlane : oPlanes)
@@ -107,7 +107,7 @@ void ApplyMask(const SourceFile& oFile, unsigned int nBitmap, const Size& oSize,
     if (oReader.GetWidth() != oFile.GetRaster().GetWidth() || oReader.GetHeight() != oFile.GetRaster().GetHeight())
         throw krv::DataException(fmt::format("{}: bitmap {} is not of the image's size", oFile.GetName(), nBitmap));
     ProgressCounter oCounter(oProgress, "mask", ReaderBytes(oReader));
-    const auto oPlanes = Reduce(oReader, {std::nullopt}, oSize.width, oSize.height, Reduction::eAverage, oCounter);
+    const auto oPlanes = Reduce(oReader, {std::nullopt}, oSize.width, oSize.height, Resampling::eAverage, oCounter);
     Multiply(oOpacity, oPlanes.front(), 1.0F);
 }
 
@@ -215,9 +215,9 @@ QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOption
     oLook.choice = ChooseDisplay(oFile, oOptions.channels);
     const DisplayChoice& oChoice = oLook.choice;
     const Size oSize = FitInto(oRaster.GetWidth(), oRaster.GetHeight(), oOptions.size);
-    const Reduction eReduction =
-        oChoice.table != nullptr || !oOptions.average ? Reduction::eNearest : Reduction::eAverage;
-    std::vector<Plane> oPlanes = ReadPlanes(oFile, oChoice.channels, oSize, eReduction, oProgress);
+    const Resampling eMethod =
+        oChoice.table != nullptr || !oOptions.average ? Resampling::eNearest : Resampling::eAverage;
+    std::vector<Plane> oPlanes = ReadPlanes(oFile, oChoice.channels, oSize, eMethod, oProgress);
     std::vector<float> oOpacity = FindOpacity(oFile, oChoice, oSize, oPlanes, oProgress);
 
     const bool bInks = oPlanes.size() == 4;

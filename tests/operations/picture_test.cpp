@@ -16,6 +16,7 @@ namespace
 {
 
 using krv::datasources::BasicReader;
+using krv::gobs::SourceStart;
 
 // The mean over each target pixel's source pixels, one by one.
 double NaiveMean(const std::string& bytes, unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight)
@@ -43,9 +44,9 @@ TEST(Reduction, IsTheMeanOfTheSourcePixelsOfEachPixel)
         BasicReader oReader(poImage.get(), {}, false);
         ProgressCounter oProgress({}, "test", 1);
         const auto oPlanes =
-            Reduce(oReader, {std::nullopt, std::nullopt}, nWidth, nHeight, Reduction::eAverage, oProgress);
+            Reduce(oReader, {std::nullopt, std::nullopt}, nWidth, nHeight, Resampling::eAverage, oProgress);
         const auto oNearest =
-            Reduce(oReader, {std::nullopt, std::nullopt}, nWidth, nHeight, Reduction::eNearest, oProgress);
+            Reduce(oReader, {std::nullopt, std::nullopt}, nWidth, nHeight, Resampling::eNearest, oProgress);
         for (unsigned int y = 0; y < nHeight; ++y)
         {
             for (unsigned int x = 0; x < nWidth; ++x)
@@ -69,11 +70,11 @@ TEST(Reduction, NoDataTakesNoPartAndLowersTheCoverage)
     BasicReader oReader(poImage.get(), {}, false);
     ProgressCounter oProgress({}, "test", 1);
     const auto oFull =
-        Reduce(oReader, {krv::gobs::SampleValue::FromUnsigned(nFirst)}, 21, 17, Reduction::eAverage, oProgress);
+        Reduce(oReader, {krv::gobs::SampleValue::FromUnsigned(nFirst)}, 21, 17, Resampling::eAverage, oProgress);
     EXPECT_EQ(oFull[0].coverage[0], 0.0F);
     EXPECT_EQ(oFull[0].coverage[1], 1.0F);
     const auto oAll =
-        Reduce(oReader, {krv::gobs::SampleValue::FromUnsigned(nFirst)}, 1, 1, Reduction::eAverage, oProgress);
+        Reduce(oReader, {krv::gobs::SampleValue::FromUnsigned(nFirst)}, 1, 1, Resampling::eAverage, oProgress);
     EXPECT_LT(oAll[0].coverage[0], 1.0F);
     EXPECT_GT(oAll[0].coverage[0], 0.5F);
 }

@@ -106,9 +106,9 @@ void ExpectMargins(IRasterReader& oSource, const AuxiliaryData& oRecord, bool bH
 void ExpectPicture(IRasterReader& oReader, const SampleValue& oValue, const std::string& background)
 {
     operations::ProgressCounter oProgress({}, "test", 1);
-    const operations::Plane oPlane = operations::Reduce(oReader, {oValue}, oReader.GetWidth(), oReader.GetHeight(),
-                                                        operations::Reduction::eNearest, oProgress)
-                                         .front();
+    const operations::Plane oPlane =
+        operations::Reduce(oReader, {oValue}, oReader.GetWidth(), oReader.GetHeight(), Resampling::eNearest, oProgress)
+            .front();
     for (std::size_t n = 0; n < background.size(); ++n)
     {
         // What is not finite is not drawn either.

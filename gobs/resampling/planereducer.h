@@ -1,0 +1,52 @@
+#pragma once
+
+#include "gobs/api.h"
+#include "gobs/resampling/nodatasamples.h"
+#include "gobs/resampling/resampling.h"
+
+#include <memory>
+#include <vector>
+
+namespace krv::gobs
+{
+
+class Raster;
+
+// One channel at the size of a picture.
+struct Plane
+{
+    unsigned int width = 0;
+    unsigned int height = 0;
+    std::vector<float> values;   // magnitude for complex channels; 0 where nothing is valid
+    std::vector<float> coverage; // share of the pixel's source pixels that are valid, 0 to 1
+};
+
+// Reduces an image to planes of any smaller size, whose values are not rounded to the image's type as those of levels
+// are. Values that are no-data, not a number or infinite are not valid. Holds sums for the rows of one row of tiles.
+class KRV_GOBS_API PlaneReducer
+{
+public:
+    // The size of the planes is not more than that of the image. oNumbers: one per channel. eMethod: eAverage is the
+    // mean of the valid source pixels that fall into a pixel, eNearest the one at their centre; ParameterException for
+    // others.
+    PlaneReducer(const DataType& oType, unsigned int nSourceWidth, unsigned int nSourceHeight, unsigned int nWidth,
+                 unsigned int nHeight, const NoDataNumbers& oNumbers, Resampling eMethod);
+    ~PlaneReducer();
+
+    // The tiles of the image without margins, each once, row by row from the left.
+    void Add(const Raster& oTile);
+    // After the last tile.
+    std::vector<Plane> TakePlanes();
+
+private:
+    class Implementation;
+    std::unique_ptr<Implementation> mpoImplementation;
+};
+
+// Where pixel i of nTarget pixels starts among nSource pixels.
+inline unsigned int SourceStart(unsigned int i, unsigned int nSource, unsigned int nTarget)
+{
+    return static_cast<unsigned int>(static_cast<unsigned long long>(i) * nSource / nTarget);
+}
+
+} // namespace krv::gobs
