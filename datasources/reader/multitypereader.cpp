@@ -274,7 +274,7 @@ void MultiTypeReader::WarnOfLoss(const krv::gobs::DataType& oType, const Place& 
                     [&](const Group& oGroup) { return krv::gobs::IsLossless(oGroup.mpoReader->GetDataType(), oType); });
     if (!bExact || oType < mpoState->moType)
         krv::nspio::Warning::Warn("Lost of information possible due to data type promotion provided by this reader.",
-                                  oPlace.GetSourceFile(), oPlace.GetLine());
+                                  oPlace);
 }
 
 void MultiTypeReader::ReadRaster(krv::gobs::Raster* poRaster)

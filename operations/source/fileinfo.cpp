@@ -130,8 +130,7 @@ auto Attempt(const SourceFile& oFile, const char* pWhat, Part oPart)
     }
     catch (const krv::Exception&)
     {
-        krv::nspio::Warning::Warn(oFile.GetName() + ": " + pWhat + " cannot be read: " + CurrentMessage(),
-                                  "operations/source/fileinfo", 0);
+        krv::nspio::Warning::Warn(oFile.GetName() + ": " + pWhat + " cannot be read: " + CurrentMessage());
         return decltype(oPart())();
     }
 }

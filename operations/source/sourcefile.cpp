@@ -129,8 +129,7 @@ OptionalNoData SourceFile::GetNoData(unsigned int nChannel) const
     const OptionalNoData oValue = krv::datasources::ParseNoData(text);
     if (!text.empty() && !oValue)
         krv::nspio::Warning::Warn(
-            fmt::format("{}: the no-data value \"{}\" is no number and is not used", moName, text),
-            "operations/source/sourcefile", 0);
+            fmt::format("{}: the no-data value \"{}\" is no number and is not used", moName, text));
     return oValue;
 }
 
@@ -214,8 +213,7 @@ LevelReader SourceFile::ReadAtLeast(const std::vector<unsigned int>& oChannels, 
         }
         catch (const krv::Exception&)
         {
-            krv::nspio::Warning::Warn(fmt::format("{}: level {} cannot be read: {}", moName, nLevel, CurrentMessage()),
-                                      "operations/source/sourcefile", 0);
+            krv::nspio::Warning::Warn(fmt::format("{}: level {} cannot be read: {}", moName, nLevel, CurrentMessage()));
         }
     }
     return {std::move(poFull), nullptr, nullptr};

@@ -70,7 +70,7 @@ void Dataset::Abandon() const noexcept
             krv::nspio::Warning::Warn(moName +
                                           ": the dataset goes without Synchronize or Close; what was written since "
                                           "the last one is lost",
-                                      oPlace.GetSourceFile(), oPlace.GetLine());
+                                      oPlace);
     }
     catch (...)
     {

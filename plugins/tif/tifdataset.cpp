@@ -226,7 +226,7 @@ void TifDataset::Complain(const std::string& trouble) const
 {
     if (trouble.empty() || !moComplaints.insert(trouble).second)
         return;
-    krv::nspio::Warning::Warn(mpoFile->GetName() + ": " + trouble, "plugins/tif/tifdataset", __LINE__);
+    krv::nspio::Warning::Warn(mpoFile->GetName() + ": " + trouble);
 }
 
 // A file whose further pages are damaged can be read, and nobody knows what of it is used.

@@ -12,5 +12,6 @@ TEST(Place, SourceFilesAreNamedFromTheRootOfTheTreeWhereverItLies)
         EXPECT_EQ(SourceFileText(pFile), "plugins/tif/page") << pFile;
     EXPECT_EQ(SourceFileText("plugins/tools/page.cpp"), "plugins/tools/page"); // a folder inside the tree
     EXPECT_EQ(SourceFileText("/a/plugins/tif/my-plugins/page.cpp"), "plugins/tif/my-plugins/page");
+    EXPECT_EQ(SourceFileText("../../operations/copy/conversion.cpp"), "operations/copy/conversion");
     EXPECT_EQ(SourceFileText("/a/b/page.cpp"), "/a/b/page");
 }

@@ -13,7 +13,7 @@ namespace krv
 // named like its own: the last one in the path counts, unless the path begins with one.
 constexpr std::string_view SourceFileText(std::string_view file)
 {
-    constexpr std::string_view ROOTS[] = {"datasources/", "toolkit/", "gobs/", "plugins/", "tools/"};
+    constexpr std::string_view ROOTS[] = {"datasources/", "toolkit/", "gobs/", "operations/", "plugins/", "tools/"};
     std::size_t nLast = 0;
     bool bBegins = false;
     for (const std::string_view root : ROOTS)

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "toolkit/api.h"
+#include "toolkit/exceptions/place.h"
 
 #include <functional>
 #include <string>
@@ -17,6 +18,11 @@ public:
 
     // Any thread. An exception of the sink passes.
     static void Warn(const std::string& message, const std::string& sourceFile, unsigned int nLine);
+    // Names the caller.
+    static void Warn(const std::string& message, const Place& oPlace = Place::Current())
+    {
+        Warn(message, oPlace.GetSourceFile(), oPlace.GetLine());
+    }
 
     // Replaces the sink and returns the former one; an empty sink is the standard one.
     static Sink SetSink(Sink oSink);

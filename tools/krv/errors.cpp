@@ -126,6 +126,8 @@ const char* IoRemedy(const std::string& message)
         if (message.ends_with(std::strerror(nError)))
             return "get the right to write there, or name a file elsewhere";
     }
+    if (message.ends_with("which is not replaced"))
+        return "take another name, or remove that file";
     return message.ends_with("by another program or dataset") ? "try again when that is done"
                                                               : "is the file complete and its disk sound?";
 }

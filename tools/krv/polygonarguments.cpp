@@ -54,8 +54,7 @@ public:
                 ReadPolygon(oPolygon);
         }
         else
-            krv::nspio::Warning::Warn("GeoJSON of type \"" + type + "\" is no polygon and is left out",
-                                      "tools/krv/polygonarguments", 0);
+            krv::nspio::Warning::Warn("GeoJSON of type \"" + type + "\" is no polygon and is left out");
         if (nDepth == 0 && oObject.contains("crs") && !oObject["crs"].is_null())
             ReadCrs(oObject["crs"]);
     }

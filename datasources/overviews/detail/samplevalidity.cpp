@@ -29,8 +29,7 @@ std::unique_ptr<ValiditySource> MakeSource(IRasterWriter& oWriter)
     if (poAccess != nullptr && poAccess->GetDataset() != nullptr)
         return std::make_unique<ValiditySource>(poAccess->GetDataset(), poAccess->GetChannels());
     krv::nspio::Warning::Warn("Overviews: the writer does not show its dataset, so that a validity mask and an alpha "
-                              "channel that is not among the written ones take no part",
-                              "datasources/overviews/overviewbuilder", 0);
+                              "channel that is not among the written ones take no part");
     return std::make_unique<ValiditySource>(oWriter);
 }
 

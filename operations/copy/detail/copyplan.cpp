@@ -22,7 +22,7 @@ namespace
 
 void Warn(const std::string& message)
 {
-    krv::nspio::Warning::Warn(message, "operations/copy/detail/copyplan", 0);
+    krv::nspio::Warning::Warn(message);
 }
 
 bool Holds(const krv::gobs::DataType& oType, const krv::datasources::NoDataValue& oValue)

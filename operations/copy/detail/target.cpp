@@ -69,7 +69,7 @@ std::string ChooseFormat(const TargetForm& oForm)
 
 void Target::Warn(const std::string& message)
 {
-    krv::nspio::Warning::Warn(message, "operations/copy/conversion", 0);
+    krv::nspio::Warning::Warn(message);
 }
 
 Target::Target(const CopyPlan& oPlan, const TargetForm& oForm, const Progress& oProgress)

@@ -221,8 +221,7 @@ void PolygonPlacer::Split(const GDBVertex& oFrom, const GDBVertex& oTo, const GD
         return;
     if (++mnAdded == MOST_ADDED)
         krv::nspio::Warning::Warn(
-            "the polygons have too many long edges; from some on they are not bent as they should be",
-            "operations/masking/detail/polygonplacer", 0);
+            "the polygons have too many long edges; from some on they are not bent as they should be");
     Split(oFrom, oMiddle, oPixelFrom, oPixel, nDepth + 1, oResult);
     oResult.push_back(oPixel);
     Split(oMiddle, oTo, oPixel, oPixelTo, nDepth + 1, oResult);

@@ -96,7 +96,7 @@ void TiffHandle::Client::Note(const char* pText, bool bWarning) noexcept
     {
         if (krv::nspio::Debugger::GetLevel() != 0)
             krv::nspio::Debugger::Debug(1, "libtiff", moReader.GetFile().GetName() + ": " + pText,
-                                        "plugins/tif/tiffhandle", __LINE__);
+                                        "plugins/tif/reading/tiffhandle", __LINE__);
     }
     catch (...)
     {
