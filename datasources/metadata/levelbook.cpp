@@ -1,11 +1,10 @@
 #include "datasources/metadata/levelbook.h"
 
 #include "datasources/metadata/auxiliarydata.h"
+#include "gobs/resampling/resampling.h"
+#include "toolkit/core/lettercase.h"
 
 #include <algorithm>
-#include <cctype>
-#include <iterator>
-#include <string_view>
 
 namespace krv::datasources
 {
@@ -74,11 +73,10 @@ std::string GetLevelMethod(const AuxiliaryData& oBook, unsigned int nLevel)
 
 std::string ParseLevelMethod(const std::string& name)
 {
-    constexpr std::string_view NAMES[] = {"NEAREST", "AVERAGE", "MODE", "BILINEAR", "CUBIC",
-                                          "LANCZOS", "RMS",     "MIN",  "MAX",      "NONE"};
-    std::string upper = name;
-    std::transform(upper.begin(), upper.end(), upper.begin(), [](unsigned char n) { return std::toupper(n); });
-    const bool bKnown = std::find(std::begin(NAMES), std::end(NAMES), upper) != std::end(NAMES);
+    const std::string upper = ToUpper(name);
+    bool bKnown = upper == "NONE";
+    for (int nMethod = 0; nMethod <= static_cast<int>(krv::gobs::Resampling::eMax); ++nMethod)
+        bKnown = bKnown || upper == GetResamplingName(static_cast<krv::gobs::Resampling>(nMethod));
     return bKnown ? upper : std::string();
 }
 

@@ -123,16 +123,6 @@ TEST(DemoFormat, NewFilesOfMixedTypesAreThereWhenTheyAreWhole)
         oDataset.WriteAuxiliaryData(oTags);
     };
     {
-        const auto oDropped = NewDemo(file);
-        EXPECT_FALSE(oDropped->Exists());
-        Lay(*oDropped);
-        EXPECT_TRUE(oDropped->Exists());
-        EXPECT_EQ(std::filesystem::file_size(file), 16u);
-        EXPECT_EQ(CountFiles(oFolder), 2);
-    }
-    EXPECT_EQ(CountFiles(oFolder), 1);
-    EXPECT_EQ(std::filesystem::file_size(file), 16u);
-    {
         const auto oDataset = NewDemo(file);
         Lay(*oDataset);
         oDataset->Synchronize();

@@ -3,25 +3,10 @@
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
-#include <cctype>
-#include <charconv>
 #include <sstream>
 
 namespace krv::plugins::support
 {
-
-std::string Options::ToUpper(std::string text)
-{
-    std::transform(text.begin(), text.end(), text.begin(), [](unsigned char n) { return std::toupper(n); });
-    return text;
-}
-
-bool Options::ParseNumber(const std::string& text, std::uint32_t& nValue)
-{
-    const char* const pEnd = text.data() + text.size();
-    const auto oResult = std::from_chars(text.data(), pEnd, nValue);
-    return oResult.ec == std::errc() && oResult.ptr == pEnd;
-}
 
 void Options::AddText(const std::string& key, std::string& target)
 {

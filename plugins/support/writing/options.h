@@ -1,9 +1,12 @@
 #pragma once
 
+#include "toolkit/core/lettercase.h"
+#include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/place.h"
 
 #include <cstdint>
 #include <functional>
+#include <optional>
 #include <string>
 #include <type_traits>
 #include <utility>
@@ -35,7 +38,7 @@ public:
             takes += (takes.empty() ? "" : ", ") + word;
         const auto Take = [&oTarget, oChoices, usual](const std::string& value)
         {
-            const std::string upper = ToUpper(value);
+            const std::string upper = krv::ToUpper(value);
             for (const auto& [word, oValue] : oChoices)
                 if (word == upper)
                     return oTarget = oValue, true;
@@ -51,11 +54,11 @@ public:
     {
         const auto Take = [&oTarget, nFrom, nTo](const std::string& value)
         {
-            std::uint32_t nValue = 0;
-            const bool bNumber = ParseNumber(value, nValue) && nValue >= nFrom && nValue <= nTo;
-            if (bNumber)
-                oTarget = static_cast<T>(nValue);
-            return bNumber;
+            const std::optional<std::uint32_t> oNumber = krv::ParseNumber<std::uint32_t>(value);
+            const bool bFits = oNumber && *oNumber >= nFrom && *oNumber <= nTo;
+            if (bFits)
+                oTarget = static_cast<T>(*oNumber);
+            return bFits;
         };
         moKeys.push_back({{key, "a number from " + std::to_string(nFrom) + " to " + std::to_string(nTo)}, Take});
     }
@@ -78,9 +81,6 @@ private:
         std::function<bool(const std::string& value)> moTake; // false for what it does not take
         bool mbGiven = false;
     };
-
-    static std::string ToUpper(std::string text);
-    static bool ParseNumber(const std::string& text, std::uint32_t& nValue);
 
     std::vector<Key> moKeys;
 };

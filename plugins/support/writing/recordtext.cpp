@@ -1,10 +1,10 @@
 #include "plugins/support/writing/recordtext.h"
 
+#include "toolkit/core/numbertext.h"
 #include "toolkit/ogc/cs/crsfactory.h"
 
 #include <algorithm>
 #include <charconv>
-#include <iomanip>
 #include <sstream>
 #include <string_view>
 
@@ -69,13 +69,12 @@ std::string WriteTags(const std::string& prefix, const krv::datasources::Metadat
 
 void RecordText::ReadOwn(const std::string& name, const std::string& value)
 {
-    unsigned int nLevel = 0;
-    std::uint64_t nPlace = 0;
+    const auto oLevel = krv::ParseNumber<unsigned int>(name.substr(std::min(name.size(), LEVEL.size())));
+    const auto oPlace = krv::ParseNumber<std::uint64_t>(value);
     if (!name.starts_with(LEVEL))
         moOwn[name] = value;
-    else if (std::istringstream(name.substr(LEVEL.size())) >> nLevel && std::istringstream(value) >> nPlace &&
-             nLevel > 1)
-        moLevels[nLevel] = nPlace;
+    else if (oLevel && oPlace && *oLevel > 1)
+        moLevels[*oLevel] = *oPlace;
 }
 
 void RecordText::Read(std::istream& oLines)
@@ -92,10 +91,10 @@ void RecordText::Read(std::istream& oLines)
             continue;
         }
         const std::string key = Decode(line.substr(nEnd + 1, nSign - nEnd - 1));
-        unsigned int nChannel = 0;
-        const char* const pEnd = std::from_chars(line.data() + 1, line.data() + nEnd, nChannel).ptr;
-        if (pEnd != line.data() + nEnd || nChannel == 0 || nChannel > moTags.GetChannelCount())
-            ReadOwn(line.substr(1, nEnd - 1), value);
+        const std::string name = line.substr(1, nEnd - 1);
+        const unsigned int nChannel = krv::ParseNumber<unsigned int>(name).value_or(0);
+        if (nChannel == 0 || nChannel > moTags.GetChannelCount())
+            ReadOwn(name, value);
         else if (key.empty())
             moTags.SetChannelDescription(value, nChannel);
         else
@@ -146,11 +145,10 @@ krv::ogc::cs::GeocodingInfo RecordText::GetGeocoding() const
 
 void RecordText::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
 {
-    std::ostringstream oText;
-    oText.imbue(std::locale::classic());
+    std::string& text = moOwn[GEOCODING];
+    text.clear();
     for (const double nTerm : oInfo.GetTerms())
-        oText << std::setprecision(17) << nTerm << ' ';
-    moOwn[GEOCODING] = oText.str();
+        text += krv::NumberText(nTerm) + " ";
 }
 
 } // namespace krv::plugins::support

@@ -24,12 +24,6 @@ std::uint32_t DivideUp(std::uint32_t nSize, std::uint32_t nPart)
     return (nSize - 1) / nPart + 1;
 }
 
-bool IsStrileTag(std::uint16_t nTag)
-{
-    return nTag == TIFFTAG_STRIPOFFSETS || nTag == TIFFTAG_STRIPBYTECOUNTS || nTag == TIFFTAG_TILEOFFSETS ||
-           nTag == TIFFTAG_TILEBYTECOUNTS;
-}
-
 std::string CodecName(std::uint16_t nCompression)
 {
     const TIFFCodec* poCodec = TIFFFindCODEC(nCompression);

@@ -4,6 +4,8 @@
 
 #include <algorithm>
 
+#include <tiff.h>
+
 namespace krv::plugins::tif
 {
 
@@ -36,6 +38,12 @@ FileHeader ReadHeader(PeekReader& oReader)
     if (!oHeader)
         throw FileFormatException(oFile.GetName(), oFile.GetName() + ": is no TIFF file");
     return *oHeader;
+}
+
+bool IsStrileTag(std::uint16_t nTag)
+{
+    return nTag == TIFFTAG_STRIPOFFSETS || nTag == TIFFTAG_STRIPBYTECOUNTS || nTag == TIFFTAG_TILEOFFSETS ||
+           nTag == TIFFTAG_TILEBYTECOUNTS;
 }
 
 std::size_t GetTypeBytes(std::uint16_t nType)

@@ -38,6 +38,9 @@ FileHeader ReadHeader(PeekReader& oReader);
 // Throws FileFormatException "<file>: <what>; the file is damaged".
 [[noreturn]] void ThrowDamaged(const std::string& fileName, const std::string& what, const Place& oPlace);
 
+// Whether a tag is one of those that say where strips or tiles lie and how long they are.
+bool IsStrileTag(std::uint16_t nTag);
+
 // Bytes of one value of a tag's type; 0 for a type that is not known.
 std::size_t GetTypeBytes(std::uint16_t nType);
 

@@ -1,10 +1,10 @@
 #include "plugins/tif/writing/encodedform.h"
 
 #include "plugins/tif/reading/compression.h"
+#include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
-#include <charconv>
 #include <sstream>
 
 #include <tiff.h>
@@ -82,13 +82,10 @@ bool SetNumbers(TagList& oTags, const Parameter& oParameter, const std::string& 
     std::istringstream oWords(text);
     for (std::string word; oWords >> word;)
     {
-        std::uint64_t nValue = 0;
-        const char* const pEnd = word.data() + word.size();
-        const auto oResult = std::from_chars(word.data(), pEnd, nValue);
-        if (oResult.ec != std::errc() || oResult.ptr != pEnd ||
-            nValue > (oParameter.mnType == TIFF_SHORT ? UINT16_MAX : UINT32_MAX))
+        const std::optional<std::uint64_t> oNumber = ParseNumber<std::uint64_t>(word);
+        if (!oNumber || *oNumber > (oParameter.mnType == TIFF_SHORT ? UINT16_MAX : UINT32_MAX))
             return false;
-        oNumbers.push_back(nValue);
+        oNumbers.push_back(*oNumber);
     }
     const std::size_t nParts = oParameter.mnType == TIFF_RATIONAL ? 2 : 1;
     if (oNumbers.empty() || oNumbers.size() % nParts != 0 || oNumbers.size() > MOST_NUMBERS)

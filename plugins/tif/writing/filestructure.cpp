@@ -22,12 +22,6 @@ constexpr std::uint64_t STRILE_MODEL_BYTES = 3 * sizeof(std::uint64_t) + sizeof(
 constexpr std::uint64_t LONGEST_LOADED_TEXT = 4096;
 constexpr std::uint64_t MAXIMUM_TAG_BYTES = std::uint64_t{96} << 20;
 
-bool IsStrileTag(std::uint16_t nTag)
-{
-    return nTag == TIFFTAG_STRIPOFFSETS || nTag == TIFFTAG_TILEOFFSETS || nTag == TIFFTAG_STRIPBYTECOUNTS ||
-           nTag == TIFFTAG_TILEBYTECOUNTS;
-}
-
 // What geometry and role of a page are taken from; the values of other tags stay in the file until they are wanted.
 bool IsNeeded(const Tag& oTag)
 {

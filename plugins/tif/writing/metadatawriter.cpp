@@ -7,7 +7,6 @@
 
 #include <algorithm>
 #include <array>
-#include <charconv>
 #include <cmath>
 #include <map>
 #include <optional>
@@ -63,13 +62,11 @@ std::optional<std::vector<double>> ParseNumbers(const std::string& text)
     std::istringstream oWords(text);
     for (std::string word; oWords >> word;)
     {
-        double nValue = 0;
-        const char* pEnd = word.data() + word.size();
-        const auto oResult = std::from_chars(word.data(), pEnd, nValue);
-        if (oResult.ec != std::errc() || oResult.ptr != pEnd)
+        const std::optional<double> oNumber = ParseNumber<double>(word);
+        if (!oNumber)
             return std::nullopt;
-        oNumbers.push_back(nValue);
-        again += (again.empty() ? "" : " ") + NumberText(nValue);
+        oNumbers.push_back(*oNumber);
+        again += (again.empty() ? "" : " ") + NumberText(*oNumber);
     }
     return again == text ? std::optional(oNumbers) : std::nullopt;
 }
