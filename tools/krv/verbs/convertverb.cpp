@@ -1,4 +1,5 @@
 #include "operations/copy/conversion.h"
+#include "toolkit/core/lettercase.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/progress.h"
@@ -28,9 +29,9 @@ struct Options
     TargetForm form;
 };
 
-krv::gobs::DataType ParseType(std::string text)
+krv::gobs::DataType ParseType(const std::string& name)
 {
-    std::transform(text.begin(), text.end(), text.begin(), [](unsigned char c) { return std::toupper(c); });
+    const std::string text = ToUpper(name);
     std::string all;
     for (int nCode = krv::gobs::eDT_8U; nCode <= krv::gobs::eDT_C64R; ++nCode)
     {
