@@ -1,6 +1,7 @@
 #include "operations/copy/detail/keptform.h"
 
 #include "datasources/interfaces/idataset.h"
+#include "toolkit/core/lettercase.h"
 
 #include <fmt/format.h>
 
@@ -24,12 +25,6 @@ constexpr const char* FORM_KEYS[] = {"COMPRESS",   "LEVEL",      "PREDICTOR",  "
                                      "BLOCKXSIZE", "BLOCKYSIZE", "INTERLEAVE", "NBITS"};
 // Stored without loss in the place of a codec that a format does not write.
 constexpr char LOSSLESS[] = "COMPRESS=DEFLATE";
-
-std::string Upper(std::string text)
-{
-    std::transform(text.begin(), text.end(), text.begin(), [](unsigned char c) { return std::toupper(c); });
-    return text;
-}
 
 // Whether blocks of the form are what an option asks for.
 bool Agrees(const std::string& key, const std::string& value, const EncodedForm& oForm)
@@ -73,7 +68,7 @@ std::map<std::string, std::string> ParseOptions(const std::string& options)
     for (std::string word; oWords >> word;)
     {
         const std::size_t nSign = std::min(word.find('='), word.size());
-        oOptions[Upper(word.substr(0, nSign))] = Upper(word.substr(std::min(nSign + 1, word.size())));
+        oOptions[krv::ToUpper(word.substr(0, nSign))] = krv::ToUpper(word.substr(std::min(nSign + 1, word.size())));
     }
     return oOptions;
 }
@@ -99,7 +94,7 @@ std::string WithoutForm(const std::string& options)
     std::istringstream oWords(options);
     for (std::string word; oWords >> word;)
     {
-        const std::string key = Upper(word.substr(0, word.find('=')));
+        const std::string key = krv::ToUpper(word.substr(0, word.find('=')));
         if (std::find(std::begin(FORM_KEYS), std::end(FORM_KEYS), key) == std::end(FORM_KEYS))
             left += (left.empty() ? "" : " ") + word;
     }

@@ -6,12 +6,12 @@
 #include "datasources/iomanager/formatcapabilities.h"
 #include "operations/copy/detail/keptform.h"
 #include "operations/job/exceptions.h"
+#include "toolkit/core/lettercase.h"
 #include "toolkit/nspio/warning.h"
 
 #include <fmt/format.h>
 
 #include <algorithm>
-#include <cctype>
 #include <filesystem>
 
 namespace krv::operations::detail
@@ -24,8 +24,7 @@ namespace
 
 bool EqualNames(const std::string& first, const std::string& second)
 {
-    return std::equal(first.begin(), first.end(), second.begin(), second.end(),
-                      [](unsigned char a, unsigned char b) { return std::tolower(a) == std::tolower(b); });
+    return krv::ToUpper(first) == krv::ToUpper(second);
 }
 
 // By the extension of the file's name when the user names no format. A name whose extension belongs to none is refused:
@@ -55,10 +54,7 @@ std::string ChooseFormat(const TargetForm& oForm)
             "--format among {}{}",
             oForm.name, extension, all, EqualNames(extension, ".png") ? " (`krv view` makes pictures)" : ""));
     if (!oForm.format.empty())
-    {
-        format = oForm.format;
-        std::transform(format.begin(), format.end(), format.begin(), [](unsigned char c) { return std::toupper(c); });
-    }
+        format = krv::ToUpper(oForm.format);
     if (!oManager.GetCapabilities(format).IsSupported(CAPABILITY_CREATE))
         throw RequestException(
             fmt::format("{}: the format {} cannot create files; choose another with --format", oForm.name, format));

@@ -1,13 +1,11 @@
 #include "operations/copy/conversion.h"
-#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/core/lettercase.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/progress.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
 
-#include <algorithm>
-#include <cctype>
 #include <limits>
 #include <memory>
 
@@ -28,9 +26,9 @@ struct Options
     TargetForm form;
 };
 
-krv::gobs::DataType ParseType(std::string text)
+krv::gobs::DataType ParseType(const std::string& given)
 {
-    std::transform(text.begin(), text.end(), text.begin(), [](unsigned char c) { return std::toupper(c); });
+    const std::string text = krv::ToUpper(given);
     std::string all;
     for (int nCode = krv::gobs::eDT_8U; nCode <= krv::gobs::eDT_C64R; ++nCode)
     {
