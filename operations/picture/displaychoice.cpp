@@ -9,6 +9,7 @@
 #include "gobs/raster/pixelvalue.h"
 #include "operations/job/exceptions.h"
 #include "operations/source/sourcefile.h"
+#include "toolkit/core/lettercase.h"
 
 #include <algorithm>
 #include <limits>
@@ -20,21 +21,14 @@ namespace krv::operations
 namespace
 {
 
-std::string Lower(std::string text)
-{
-    for (char& c : text)
-        c = c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
-    return text;
-}
-
-// What a channel says it shows: its colour interpretation, else its description; in lower case.
+// What a channel says it shows: its colour interpretation, else its description; in capitals.
 std::string RoleOf(const SourceFile& oFile, unsigned int nChannel)
 {
     const auto& oMetadata = oFile.GetMetadata();
     if (nChannel > oMetadata.GetChannelCount())
         return {};
-    const std::string role = Lower(oMetadata.GetChanMetadataValue("COLORINTERP", nChannel));
-    return !role.empty() ? role : Lower(oMetadata.GetChannelDescription(nChannel));
+    const std::string role = krv::ToUpper(oMetadata.GetChanMetadataValue("COLORINTERP", nChannel));
+    return !role.empty() ? role : krv::ToUpper(oMetadata.GetChannelDescription(nChannel));
 }
 
 unsigned int FindRole(const SourceFile& oFile, const std::string& role)
@@ -91,7 +85,7 @@ std::shared_ptr<krv::gobs::PCT> TableOf(const SourceFile& oFile, unsigned int nC
 
 bool UseRoles(const SourceFile& oFile, DisplayChoice& oChoice)
 {
-    oChoice.channels = IfAllThere(oFile, {FindRole(oFile, "red"), FindRole(oFile, "green"), FindRole(oFile, "blue")});
+    oChoice.channels = IfAllThere(oFile, {FindRole(oFile, "RED"), FindRole(oFile, "GREEN"), FindRole(oFile, "BLUE")});
     oChoice.reason = DisplayReason::eRoles;
     return !oChoice.channels.empty();
 }
@@ -105,7 +99,8 @@ float FullScale(const krv::gobs::DataType& oType)
 
 bool UseInks(const SourceFile& oFile, DisplayChoice& oChoice)
 {
-    if (Lower(oFile.GetMetadata().GetFileMetadataValue("PHOTOMETRIC")) != "separated" || oFile.GetChannelCount() < 4)
+    if (krv::ToUpper(oFile.GetMetadata().GetFileMetadataValue("PHOTOMETRIC")) != "SEPARATED" ||
+        oFile.GetChannelCount() < 4)
         return false;
     oChoice.channels = {1, 2, 3, 4};
     oChoice.inkFull = FullScale(oFile.GetType(1));
@@ -164,12 +159,13 @@ DisplayChoice ChooseDisplay(const SourceFile& oFile, const std::vector<unsigned 
     {
         oChoice.alphaFull = FullScale(oFile.GetType(oChoice.alphaChannel));
         oChoice.premultiplied =
-            Lower(oFile.GetMetadata().GetChanMetadataValue("AlphaKind", oChoice.alphaChannel)) == "premultiplied";
+            krv::ToUpper(oFile.GetMetadata().GetChanMetadataValue("AlphaKind", oChoice.alphaChannel)) ==
+            "PREMULTIPLIED";
     }
     if (oChoice.channels.size() == 1)
     {
         oChoice.table = TableOf(oFile, oChoice.channels.front());
-        oChoice.inverted = Lower(oFile.GetMetadata().GetFileMetadataValue("PHOTOMETRIC")) == "miniswhite";
+        oChoice.inverted = krv::ToUpper(oFile.GetMetadata().GetFileMetadataValue("PHOTOMETRIC")) == "MINISWHITE";
     }
     if (const auto* const poBitmaps = dynamic_cast<krv::datasources::IBitmapDataset*>(&oFile.GetDataset()))
         oChoice.maskBitmap = krv::datasources::FindValidityMask(*poBitmaps);

@@ -1,7 +1,6 @@
 #include "tools/krv/polygonarguments.h"
 
 #include "operations/source/sourcefile.h"
-#include "toolkit/core/lettercase.h"
 #include "toolkit/nspio/warning.h"
 #include "tools/krv/errors.h"
 
@@ -136,7 +135,8 @@ void ReadGeoJson(const std::string& text, operations::PolygonText& oResult)
 bool IsPolygonText(const std::string& text)
 {
     const auto oFirst = std::find_if_not(text.begin(), text.end(), IsBlank);
-    const std::string start = ToUpper(std::string(oFirst, text.end() - oFirst > 19 ? oFirst + 19 : text.end()));
+    std::string start(oFirst, text.end() - oFirst > 19 ? oFirst + 19 : text.end());
+    std::transform(start.begin(), start.end(), start.begin(), [](unsigned char c) { return std::toupper(c); });
     const auto Starts = [&start](const char* pWith)
     {
         return start.starts_with(pWith);

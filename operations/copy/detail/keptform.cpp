@@ -6,6 +6,7 @@
 #include <fmt/format.h>
 
 #include <algorithm>
+#include <cctype>
 #include <sstream>
 
 namespace krv::operations::detail
@@ -67,7 +68,7 @@ std::map<std::string, std::string> ParseOptions(const std::string& options)
     for (std::string word; oWords >> word;)
     {
         const std::size_t nSign = std::min(word.find('='), word.size());
-        oOptions[ToUpper(word.substr(0, nSign))] = ToUpper(word.substr(std::min(nSign + 1, word.size())));
+        oOptions[krv::ToUpper(word.substr(0, nSign))] = krv::ToUpper(word.substr(std::min(nSign + 1, word.size())));
     }
     return oOptions;
 }
@@ -93,7 +94,7 @@ std::string WithoutForm(const std::string& options)
     std::istringstream oWords(options);
     for (std::string word; oWords >> word;)
     {
-        const std::string key = ToUpper(word.substr(0, word.find('=')));
+        const std::string key = krv::ToUpper(word.substr(0, word.find('=')));
         if (std::find(std::begin(FORM_KEYS), std::end(FORM_KEYS), key) == std::end(FORM_KEYS))
             left += (left.empty() ? "" : " ") + word;
     }

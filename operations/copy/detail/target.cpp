@@ -24,7 +24,7 @@ namespace
 
 bool EqualNames(const std::string& first, const std::string& second)
 {
-    return ToUpper(first) == ToUpper(second);
+    return krv::ToUpper(first) == krv::ToUpper(second);
 }
 
 // By the extension of the file's name when the user names no format. A name whose extension belongs to none is refused:
@@ -54,7 +54,7 @@ std::string ChooseFormat(const TargetForm& oForm)
             "--format among {}{}",
             oForm.name, extension, all, EqualNames(extension, ".png") ? " (`krv view` makes pictures)" : ""));
     if (!oForm.format.empty())
-        format = ToUpper(oForm.format);
+        format = krv::ToUpper(oForm.format);
     if (!oManager.GetCapabilities(format).IsSupported(CAPABILITY_CREATE))
         throw RequestException(
             fmt::format("{}: the format {} cannot create files; choose another with --format", oForm.name, format));

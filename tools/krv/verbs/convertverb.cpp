@@ -1,14 +1,11 @@
 #include "operations/copy/conversion.h"
 #include "toolkit/core/lettercase.h"
-#include "toolkit/exceptions/exceptions.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/progress.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
 
-#include <algorithm>
-#include <cctype>
 #include <limits>
 #include <memory>
 
@@ -29,9 +26,9 @@ struct Options
     TargetForm form;
 };
 
-krv::gobs::DataType ParseType(const std::string& name)
+krv::gobs::DataType ParseType(const std::string& given)
 {
-    const std::string text = ToUpper(name);
+    const std::string text = krv::ToUpper(given);
     std::string all;
     for (int nCode = krv::gobs::eDT_8U; nCode <= krv::gobs::eDT_C64R; ++nCode)
     {
