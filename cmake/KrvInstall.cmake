@@ -27,8 +27,10 @@ install(FILES ${CMAKE_BINARY_DIR}/package/krvdatasourcesConfig.cmake
               ${CMAKE_CURRENT_LIST_DIR}/KrvPlugin.cmake
         DESTINATION ${KRV_PACKAGE_DIR})
 
-configure_file(${CMAKE_CURRENT_LIST_DIR}/krvdatasources.pc.in ${CMAKE_BINARY_DIR}/package/krvdatasources.pc @ONLY)
-install(FILES ${CMAKE_BINARY_DIR}/package/krvdatasources.pc DESTINATION lib/pkgconfig)
+foreach(module krvdatasources krvoperations)
+  configure_file(${CMAKE_CURRENT_LIST_DIR}/${module}.pc.in ${CMAKE_BINARY_DIR}/package/${module}.pc @ONLY)
+  install(FILES ${CMAKE_BINARY_DIR}/package/${module}.pc DESTINATION lib/pkgconfig)
+endforeach()
 
 # For authors of format plug-ins: the worked example; tools/conformance installs the conformance checks.
 install(FILES ${CMAKE_SOURCE_DIR}/examples/formatplugin/CMakeLists.txt DESTINATION share/krv/formatplugin)

@@ -70,6 +70,10 @@ export PKG_CONFIG_PATH=$oHome/lib/pkgconfig
 quietly pkgconfig "$oCompiler" -std=c++20 "$oWork/readtiles/main.cpp" -o "$oWork/readtiles/plain" \
     $(pkg-config --cflags --libs krvdatasources) -Wl,-rpath,"$oHome/lib"
 expect "4 tiles" "$oWork/readtiles/plain" "$oWork/rgb.tif"
+# shellcheck disable=SC2046
+quietly jobs "$oCompiler" -std=c++20 "$oSource/examples/channelstats/main.cpp" -o "$oWork/channelstats" \
+    $(pkg-config --cflags --libs krvoperations) -Wl,-rpath,"$oHome/lib"
+expect "channel 3 (8U): mean" "$oWork/channelstats" "$oWork/rgb.tif"
 
 # The example format goes out of the home and comes back as a stranger's plug-in.
 cp -r "$oHome/share/krv/formatplugin" "$oWork/plugin"
