@@ -36,8 +36,8 @@ RegexMetadataFilter::~RegexMetadataFilter() = default;
 
 bool RegexMetadataFilter::operator()(const std::string& key, const std::string&) const
 {
-    if (mpoExpression->moPlain)
-        return mpoExpression->moPlain->Search(key);
+    if (const auto& oPlain = mpoExpression->moPlain)
+        return oPlain->Search(key);
     return boost::regex_search(key, mpoExpression->moRegex);
 }
 

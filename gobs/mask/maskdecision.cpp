@@ -75,8 +75,10 @@ Mask* MaskDecisionBuilder::BuildMask(const Raster& oRaster) const
     return oMask.release();
 }
 
-IMaskDecisionImpl* GetMaskDecisionImpl(DataType oType, unsigned long long nChannels, BkgdRule eRule,
-                                       std::vector<double> oValues, std::vector<unsigned int> oChannels)
+IMaskDecisionImpl*
+GetMaskDecisionImpl(DataType oType, unsigned long long nChannels, BkgdRule eRule,
+                    std::vector<double> oValues,         // NOLINT(performance-unnecessary-value-param)
+                    std::vector<unsigned int> oChannels) // NOLINT(performance-unnecessary-value-param)
 {
     return MakeImpl(oType, nChannels, eRule, oValues, oChannels, Place::Current()).release();
 }

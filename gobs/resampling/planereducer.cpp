@@ -263,6 +263,7 @@ public:
     std::vector<Plane> TakePlanes()
     {
         std::vector<Plane> oPlanes;
+        oPlanes.reserve(moBuilders.size());
         for (const auto& poBuilder : moBuilders)
             oPlanes.push_back(poBuilder->TakePlane());
         return oPlanes;

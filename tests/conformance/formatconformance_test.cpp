@@ -78,7 +78,8 @@ struct FormatTraits
         {
             oManager->CreateLevel(nLevel);
             for (unsigned int nChannel = 1; nChannel <= oImage.moTypes.size(); ++nChannel)
-                Write(oManager->GetOverviewIO(nLevel, {nChannel}), nChannel + 1000 * nLevel, oImage.moTypes[0]);
+                Write(oManager->GetOverviewIO(nLevel, {nChannel}), nChannel + 1000 * nLevel,
+                      oImage.moTypes[nChannel - 1]);
         }
         oDataset->Close();
     }

@@ -9,8 +9,9 @@ BUILD=$1
 # A planted fault first: a check that cannot fail is none.
 oPlanted=$(mktemp -d)
 trap 'rm -rf "$oPlanted"' EXIT
-printf 'bool f(int n) { return n == 1 || n == 1; }\n' >"$oPlanted/planted.cpp"
-if "$CHECKER" --quiet --config-file=.clang-tidy "$oPlanted/planted.cpp" -- >/dev/null 2>&1; then
+printf '#include <string>\nauto f(std::string s) { auto t = std::move(s); return s.size(); }\n' >"$oPlanted/planted.cpp"
+if ! "$CHECKER" --quiet --config-file=.clang-tidy "$oPlanted/planted.cpp" -- -std=c++20 2>&1 |
+    grep -q bugprone-use-after-move; then
     echo "$CHECKER does not see a planted fault" >&2
     exit 1
 fi
