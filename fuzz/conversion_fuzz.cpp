@@ -134,11 +134,6 @@ void TryMerge(Choices& oChoices)
 
 } // namespace
 
-extern "C" int LLVMFuzzerInitialize(int*, char***)
-{
-    return 0;
-}
-
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* poBytes, std::size_t nBytes)
 {
     Choices oChoices(poBytes, nBytes);

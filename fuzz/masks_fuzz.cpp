@@ -1,10 +1,12 @@
 // Masks from polygons and from values, each beside a decision pixel by pixel.
 #include "datasources/maskbuilder/polygonmaskbuilder.h"
+#include "datasources/metadata/typednodata.h"
 #include "fuzz/support/choices.h"
 #include "gobs/mask/exactmaskdecision.h"
 #include "gobs/mask/mask.h"
 #include "gobs/raster/raster.h"
 #include "tests/support/conversionmodel.h"
+#include "tests/support/nodatatexts.h"
 #include "toolkit/core/gglshape.h"
 
 #include <memory>
@@ -235,34 +237,14 @@ bool Equals(const unsigned char* pSample, const krv::test::Type& oType, const Sa
 
 SampleValue ChooseValue(Choices& oChoices, const krv::test::Type& oType)
 {
-    constexpr double VALUES[] = {0,
-                                 1,
-                                 -1,
-                                 0.5,
-                                 0.1,
-                                 255,
-                                 256,
-                                 -128,
-                                 NOT_A_NUMBER,
-                                 1e30,
-                                 -0.0,
-                                 65535,
-                                 -9999,
-                                 INFINITE,
-                                 -3.4028234663852886e38,
-                                 3.4028235677973366e38,
-                                 1.7e308,
-                                 1e39,
-                                 9223372036854775808.0,
-                                 18446744073709551616.0,
-                                 4294967295.0,
-                                 16777217};
+    static const std::vector<std::string> TEXTS = krv::test::NoDataTexts();
+    const auto oText = krv::datasources::ParseNoData(oChoices.Of(TEXTS));
     switch (oChoices.Below(4))
     {
     case 0:
         return SampleValue::FromReal(oChoices.Below(3));
     case 1:
-        return SampleValue::FromReal(oChoices.Of(VALUES));
+        return oChoices.OneIn(2) ? *oText : SampleValue::FromReal(oText->GetReal());
     case 2:
         return SampleValue::FromUnsigned(
             oChoices.OneIn(2) ? static_cast<std::uint64_t>(oType.mpoPart->mnHigh > 1e20L ? 7 : oType.mpoPart->mnHigh)
@@ -332,11 +314,6 @@ void TryValues(Choices& oChoices)
 }
 
 } // namespace
-
-extern "C" int LLVMFuzzerInitialize(int*, char***)
-{
-    return 0;
-}
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* poBytes, std::size_t nBytes)
 {

@@ -211,6 +211,7 @@ Known MakeReader(const Scene& oScene, Choices& oChoices)
         oKnown.mpoLevels.reset(oKnown.mpoReader->GetOverviewReaderAccessor());
         Check(oKnown.mpoLevels->GetLevels() == oScene.GetLevels() && oKnown.mpoLevels->IsLevelValid(nLevel), "levels");
         oKnown.mpoReader.reset(oKnown.mpoLevels->CreateRasterReader(nLevel));
+        Check(oKnown.mpoReader->GetOverviewReaderAccessor() == nullptr, "a level has levels");
         oPlaced = oChannels;
     }
     oKnown.moImage = oScene.GetImage(oPlaced, oType, nLevel);

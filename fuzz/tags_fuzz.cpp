@@ -1,10 +1,8 @@
 // Any contents in the tags that say something of a sound image: metadata, no-data, geographic keys, sensor model. The
 // same texts go to the functions that read tags of the metadata.
-#include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/typednodata.h"
 #include "fuzz/support/exercise.h"
 #include "fuzz/support/inputfile.h"
-#include "toolkit/nspio/warning.h"
 
 #include <fuzzer/FuzzedDataProvider.h>
 
@@ -61,13 +59,6 @@ std::string MakeFile(std::map<std::uint16_t, std::pair<std::uint16_t, std::strin
 }
 
 } // namespace
-
-extern "C" int LLVMFuzzerInitialize(int*, char***)
-{
-    krv::nspio::Warning::SetSink([](const std::string&, const std::string&, unsigned int) {});
-    krv::datasources::DatasetManager::GetInstance();
-    return 0;
-}
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* poBytes, std::size_t nBytes)
 {

@@ -52,19 +52,24 @@ std::size_t ValueBytes(const krv::gobs::DataType& oType)
     return oType.GetValueBits() / 8;
 }
 
+// Zeros, all of them known.
+Samples MakeSamples(unsigned int nWidth, unsigned int nHeight, unsigned int nChannels, std::size_t nValueBytes)
+{
+    const std::size_t nValues = std::size_t{nWidth} * nHeight * nChannels;
+    return {nWidth,
+            nHeight,
+            nChannels,
+            nValueBytes,
+            std::vector<unsigned char>(nValues * nValueBytes),
+            std::vector<unsigned char>(nValues, 1)};
+}
+
 // A part that cannot be read is tried value by value of a row.
 Samples ReadSamples(const std::function<IRasterIO*(const std::vector<unsigned int>&)>& oMakeIO, unsigned int nChannels,
                     std::size_t nValueBytes)
 {
-    Samples oSamples;
     std::unique_ptr<IRasterIO> poIO(oMakeIO(Count(nChannels)));
-    oSamples.mnWidth = poIO->GetFileWidth();
-    oSamples.mnHeight = poIO->GetFileHeight();
-    oSamples.mnChannels = nChannels;
-    oSamples.mnValueBytes = nValueBytes;
-    const std::size_t nValues = std::size_t{oSamples.mnWidth} * oSamples.mnHeight * nChannels;
-    oSamples.moBytes.resize(nValues * nValueBytes);
-    oSamples.moKnown.assign(nValues, 1);
+    Samples oSamples = MakeSamples(poIO->GetFileWidth(), poIO->GetFileHeight(), nChannels, nValueBytes);
     try
     {
         poIO->ReadWindow(0U, 0U, oSamples.mnWidth, oSamples.mnHeight, oSamples.moBytes.data());
@@ -163,8 +168,7 @@ View Look(TifDataset& oDataset)
         }
     }
     const krv::ogc::cs::GeocodingInfo& oInfo = oDataset.GetGeocoding();
-    for (const double nValue : {oInfo.GetXOffset(), oInfo.GetXPerColumn(), oInfo.GetXPerRow(), oInfo.GetYOffset(),
-                                oInfo.GetYPerColumn(), oInfo.GetYPerRow()})
+    for (const double nValue : oInfo.GetTerms())
         oView.moGeography += std::to_string(nValue) + " ";
     try
     {
@@ -223,11 +227,9 @@ void Rearrange(Samples& oSamples, const std::vector<unsigned int>& oSources)
 {
     if (oSamples.mnWidth == 0)
         return; // a page that cannot be read
-    Samples oNew = oSamples;
+    Samples oNew = MakeSamples(oSamples.mnWidth, oSamples.mnHeight, static_cast<unsigned int>(oSources.size()),
+                               oSamples.mnValueBytes);
     const std::size_t nPixels = std::size_t{oSamples.mnWidth} * oSamples.mnHeight;
-    oNew.mnChannels = static_cast<unsigned int>(oSources.size());
-    oNew.moBytes.assign(nPixels * oSources.size() * oSamples.mnValueBytes, 0);
-    oNew.moKnown.assign(nPixels * oSources.size(), 1);
     for (std::size_t nPixel = 0; nPixel < nPixels; ++nPixel)
         for (std::size_t nAt = 0; nAt < oSources.size(); ++nAt)
             if (oSources[nAt] != 0)
@@ -459,13 +461,11 @@ void Edits::ChangeLevels()
                 [&]
                 {
                     poLevels->CreateLevel(nLevel);
-                    Samples oLevel = moModel.moImage;
-                    oLevel.mnWidth = (oLevel.mnWidth - 1) / nLevel + 1;
-                    oLevel.mnHeight = (oLevel.mnHeight - 1) / nLevel + 1;
-                    const std::size_t nValues = std::size_t{oLevel.mnWidth} * oLevel.mnHeight * oLevel.mnChannels;
-                    oLevel.moBytes.assign(nValues * oLevel.mnValueBytes, 0);
-                    oLevel.moKnown.assign(nValues, 1);
-                    if (!moModel.moLevels.emplace(nLevel, std::move(oLevel)).second)
+                    const Samples& oImage = moModel.moImage;
+                    const auto oMade = moModel.moLevels.emplace(
+                        nLevel, MakeSamples((oImage.mnWidth - 1) / nLevel + 1, (oImage.mnHeight - 1) / nLevel + 1,
+                                            oImage.mnChannels, oImage.mnValueBytes));
+                    if (!oMade.second)
                         Complain("a level was made twice");
                     moModel.moStates[nLevel].assign(moModel.moImage.mnChannels, '0');
                 },
@@ -516,13 +516,10 @@ void Edits::ChangeBitmaps()
             Try("bitmap made",
                 [&]
                 {
-                    const std::size_t nPixels = std::size_t{moModel.moImage.mnWidth} * moModel.moImage.mnHeight;
-                    const unsigned int nNew = mpoDataset->CreateBitmap();
-                    if (!moModel.moBitmaps
-                             .emplace(nNew, Samples{moModel.moImage.mnWidth, moModel.moImage.mnHeight, 1, 1,
-                                                    std::vector<unsigned char>(nPixels, 0),
-                                                    std::vector<unsigned char>(nPixels, 1)})
-                             .second)
+                    const Samples& oImage = moModel.moImage;
+                    const auto oMade = moModel.moBitmaps.emplace(mpoDataset->CreateBitmap(),
+                                                                 MakeSamples(oImage.mnWidth, oImage.mnHeight, 1, 1));
+                    if (!oMade.second)
                         Complain("a bitmap was made twice");
                 },
                 {&View::moBitmapTexts});
@@ -634,37 +631,21 @@ void Edits::Reopen()
     Check("opening again", Look(*mpoDataset));
 }
 
+void Edits::Synchronize()
+{
+    if (!Try("synchronising", [&] { mpoDataset->Synchronize(); }, {}))
+        return;
+    moStored = moModel;
+    mbNamed = true;
+}
+
 void Edits::Step()
 {
-    switch (moProgram.Below(12))
-    {
-    case 0:
-    case 1:
-    case 2:
-        return WriteWindow();
-    case 3:
-        return ChangeChannels();
-    case 4:
-        return ChangeRecord();
-    case 5:
-    case 6:
-        return ChangeLevels();
-    case 7:
-        return ChangeBitmaps();
-    case 8:
-        return ChangeTables();
-    case 9:
-        return ChangeGeography();
-    case 10:
-        if (Try("synchronising", [&] { mpoDataset->Synchronize(); }, {}))
-        {
-            moStored = moModel;
-            mbNamed = true;
-        }
-        return;
-    default:
-        return Reopen();
-    }
+    constexpr void (Edits::*STEPS[])() = {&Edits::WriteWindow,     &Edits::WriteWindow,   &Edits::WriteWindow,
+                                          &Edits::ChangeChannels,  &Edits::ChangeRecord,  &Edits::ChangeLevels,
+                                          &Edits::ChangeLevels,    &Edits::ChangeBitmaps, &Edits::ChangeTables,
+                                          &Edits::ChangeGeography, &Edits::Synchronize,   &Edits::Reopen};
+    (this->*moProgram.Of(STEPS))();
 }
 
 void Edits::Run(TifPointer poDataset)

@@ -69,6 +69,7 @@ private:
     void ChangeBitmaps();
     void ChangeTables();
     void ChangeGeography();
+    void Synchronize();
     void Reopen();
 
     std::string moFileName;

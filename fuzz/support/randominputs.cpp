@@ -11,11 +11,12 @@
 #include <vector>
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* poBytes, std::size_t nBytes);
-extern "C" int LLVMFuzzerInitialize(int*, char***);
+extern "C" [[gnu::weak]] int LLVMFuzzerInitialize(int*, char***); // not every fuzzer has one
 
 int main(int nArguments, char** pArguments)
 {
-    LLVMFuzzerInitialize(&nArguments, &pArguments);
+    if (LLVMFuzzerInitialize != nullptr)
+        LLVMFuzzerInitialize(&nArguments, &pArguments);
     std::string input;
     try
     {

@@ -144,7 +144,7 @@ void TifDataset::SetBitmapMetadata(unsigned int nBitmap, const krv::datasources:
     for (const char* pKey : MASK_KEYS)
         oMap[pKey] = oRecord.GetFileMetadataValue(pKey);
     oRecord.SetFileMetadata(oMap);
-    Edit([&] { MetadataWriter(oEditor, oEditor.GetPage(nPage)).Write(oRecord, oPlace); });
+    Edit([&] { WriteMetadata(oEditor, oEditor.GetPage(nPage), oRecord, oPlace); });
 }
 
 krv::datasources::IOverviewManager* TifDataset::GetBitmapOverviewManager()

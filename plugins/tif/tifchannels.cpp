@@ -67,15 +67,14 @@ void TifDataset::ChangeChannels(const std::vector<unsigned int>& oSources, const
     std::vector<std::uint64_t> oNumbers = {oEditor.GetPages().front()->mnNumber};
     for (const PageLevel& oLevel : GetLevels(PixelUse::eImage))
         oNumbers.push_back(oLevel.moPage.mnOffset);
-    const ChannelEditor oChannels(oEditor, oSources);
     std::shared_ptr<support::IBlockSource> poSource;
     Edit(
         [&]
         {
-            MetadataWriter(oEditor, oEditor.GetPages().front()).Write(oBare, oPlace);
+            WriteMetadata(oEditor, oEditor.GetPages().front(), oBare, oPlace);
             for (const std::uint64_t nNumber : oNumbers)
-                oChannels.Rebuild(oEditor.GetPage(nNumber), oPlace);
-            MetadataWriter(oEditor, oEditor.GetPages().front()).Write(oNew, oPlace);
+                RebuildChannels(oEditor, oSources, oEditor.GetPage(nNumber), oPlace);
+            WriteMetadata(oEditor, oEditor.GetPages().front(), oNew, oPlace);
             poSource = MakeSource(oEditor.GetPages().front(), PixelUse::eImage);
         });
     moImages.clear();

@@ -92,8 +92,7 @@ public:
     void WriteBook(const krv::datasources::AuxiliaryData& oBook, bool bValid, const Place& oPlace) override
     {
         FileEditor& oEditor = *moDataset.mpoEditor;
-        moDataset.Edit(
-            [&] { MetadataWriter(oEditor, oEditor.GetPage(moDataset.GetFullPage(meUse))).Write(oBook, oPlace); });
+        moDataset.Edit([&] { WriteMetadata(oEditor, oEditor.GetPage(moDataset.GetFullPage(meUse)), oBook, oPlace); });
         if (meUse == PixelUse::eImage && bValid)
             moDataset.WatchImage();
     }
@@ -163,7 +162,7 @@ void TifDataset::ForgetOldPixels()
         {
             if (bRanges)
                 mpoEditor->GetPages().front()->DropRanges();
-            MetadataWriter(*mpoEditor, mpoEditor->GetPages().front()).Write(oBook, Place::Current());
+            WriteMetadata(*mpoEditor, mpoEditor->GetPages().front(), oBook, Place::Current());
         });
 }
 

@@ -33,7 +33,7 @@ void TifDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData
     const krv::datasources::AuxiliaryData& oBook = GetBook(PixelUse::eImage);
     for (const PageLevel& oLevel : GetLevels(PixelUse::eImage))
         CopyLevel(oBook, oRecord, oLevel.mnLevel);
-    Edit([&] { MetadataWriter(oEditor, oEditor.GetPages().front()).Write(oRecord, oPlace); });
+    Edit([&] { WriteMetadata(oEditor, oEditor.GetPages().front(), oRecord, oPlace); });
     WatchImage();
 }
 

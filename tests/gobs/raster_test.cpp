@@ -5,22 +5,9 @@
 #include <gtest/gtest.h>
 
 #include <cstdint>
-#include <cstring>
 
 using namespace krv;
 using namespace krv::gobs;
-
-TEST(RasterTest, BufferCoversMarginsChannelsAndParts)
-{
-    Raster oRaster(RasterInfo(5, 3, 2, DataType(eDT_C16U)), RasterContext(-4, 7, 2, 1));
-    EXPECT_EQ(oRaster.GetX(), -4);
-    EXPECT_EQ(oRaster.GetY(), 7);
-    EXPECT_EQ(oRaster.GetFullWidth(), 9u);
-    EXPECT_EQ(oRaster.GetFullHeight(), 5u);
-    EXPECT_EQ(oRaster.GetBufferSize(), 9u * 5 * 2 * 4);
-    EXPECT_EQ(reinterpret_cast<std::uintptr_t>(oRaster.GetBuffer()) % 64, 0u);
-    std::memset(oRaster.GetBuffer(), 1, oRaster.GetBufferSize());
-}
 
 TEST(RasterTest, HugeExtentsAreCountedNotWrapped)
 {

@@ -91,21 +91,10 @@ inline void ModelValue(const unsigned char* pSource, const Type& oSource, unsign
 // neighbours, and halves, as far as the type holds them.
 inline std::vector<unsigned char> BoundaryValues(const Part& oPart)
 {
-    std::vector<long double> oValues = {0,
-                                        0.25L,
-                                        0.5L,
-                                        1.5L,
-                                        2.5L,
-                                        -0.5L,
-                                        -1.5L,
-                                        -2.5L,
-                                        0.49999997L,
-                                        123456.5L,
-                                        1e30L,
-                                        0.5L + 1e-10L,
-                                        1.5L - 1e-10L,
-                                        3000000000.5L + 1e-6L,
-                                        -0.5L - 1e-10L};
+    std::vector<long double> oValues = {0, 0.25L, 0.49999997L, 123456.5L, 1e30L, 3000000000.5L + 1e-6L};
+    for (const long double nHalf : {0.5L, 1.5L, 2.5L})
+        for (const long double nStep : {0.0L, 1e-10L, -1e-10L})
+            oValues.insert(oValues.end(), {nHalf + nStep, -nHalf - nStep});
     for (const Part& oOther : PARTS)
         for (long double nLimit : {oOther.mnLow, oOther.mnHigh})
             for (long double nStep : {-1.0L, -0.5L, 0.0L, 0.5L, 1.0L, 1.5L})

@@ -67,13 +67,7 @@ const std::vector<Facts>& GetFacts()
 
 std::uint16_t ToHalf(float nValue)
 {
-    const auto nBits = std::bit_cast<std::uint32_t>(nValue);
-    const std::uint32_t nSign = nBits >> 16U & 0x8000U, nExponent = nBits >> 23U & 255U, nFraction = nBits & 0x7FFFFFU;
-    if (nExponent == 255)
-        return static_cast<std::uint16_t>(nSign | 0x7C00U | nFraction >> 13U);
-    if (nExponent > 112)
-        return static_cast<std::uint16_t>(nSign | (nExponent - 112) << 10U | nFraction >> 13U);
-    return static_cast<std::uint16_t>(nExponent < 102 ? nSign : nSign | (nFraction | 0x800000U) >> (126 - nExponent));
+    return std::bit_cast<std::uint16_t>(static_cast<_Float16>(nValue));
 }
 
 } // namespace krv::test

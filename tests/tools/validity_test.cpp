@@ -15,7 +15,7 @@
 #include "gobs/raster/raster.h"
 #include "operations/picture/reduction.h"
 #include "operations/statistics/statistics.h"
-#include "tests/support/facts.h"
+#include "tests/support/nodatatexts.h"
 #include "tests/tools/programrun.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "tools/conformance/tempfolder.h"
@@ -35,13 +35,6 @@ namespace
 using namespace krv::datasources;
 using namespace krv::gobs;
 
-const std::vector<std::string> TEXTS =
-    krv::test::Split("0 -0.0 1 7.5 -1 255 256 -128 65535 -32768 4294967295 1e10 0.1 9007199254740993 "
-                     "-9223372036854775808 9223372036854775807 18446744073709551615 9.223372036854775808e18 "
-                     "1.8446744073709552e19 3.4028235e38 3.4028237e38 -3.4028234663852886e+38 -1.7976931348623157e308 "
-                     "1.7976931348623157e308 nan inf -inf 1e-50",
-                     ' ');
-
 std::string BitsOf(IMaskBuilder* poBuilder, const Raster& oRaster)
 {
     const std::unique_ptr<IMaskBuilder> oBuilder(poBuilder);
@@ -57,7 +50,7 @@ std::vector<std::string> MakeValues(const DataType& oType)
 {
     std::vector<std::string> oValues;
     std::string value(static_cast<std::size_t>(oType.GetValueBits() / 8), '\0');
-    for (const std::string& text : TEXTS)
+    for (const std::string& text : krv::test::NoDataTexts())
         if (StoreSample(*ParseNoData(text), oType, reinterpret_cast<unsigned char*>(value.data())))
             oValues.push_back(value);
     if (oType.IsComplex())
@@ -129,7 +122,7 @@ TEST(Validity, EverybodySaysTheSameOfAValue)
         const DataType oType(eType);
         const std::unique_ptr<Raster> oMade = MakeImage(oType);
         const Raster& oImage = *oMade;
-        for (const std::string& text : TEXTS)
+        for (const std::string& text : krv::test::NoDataTexts())
         {
             SCOPED_TRACE(oType.Describe() + " and " + text);
             const SampleValue oValue = *ParseNoData(text);

@@ -259,16 +259,6 @@ void UnpackRow(const BitSource& oSource, std::uint64_t nBit, unsigned char* dest
         Store(destination + i * sizeof(Signed), TakeTop<Signed>(oSource.GetAnywhere(nBit, nBits), nBits, bSigned));
 }
 
-template <typename Signed>
-void UnpackRows(const BitSource& oSource, std::size_t nSourcePitch, unsigned char* destination,
-                std::size_t nDestinationPitch, std::size_t nSamples, std::size_t nRows, unsigned int nBits,
-                bool bSigned)
-{
-    for (std::size_t i = 0; i < nRows; ++i)
-        UnpackRow<Signed>(oSource, std::uint64_t{i} * nSourcePitch * 8, destination + i * nDestinationPitch, nSamples,
-                          nBits, bSigned);
-}
-
 // Eight pixels of one bit each, as bytes with the first one at the lowest address.
 std::uint64_t SpreadBits(unsigned char nBits)
 {
@@ -389,20 +379,22 @@ void UnpackBits(const unsigned char* source, std::size_t nSourceBytes, std::size
                              destination + i * nDestinationPitch, nRowSamples);
         return;
     }
+    const auto Unpack = [&]<typename Signed>(Signed)
+    {
+        for (std::size_t i = 0; i < nRows; ++i)
+            UnpackRow<Signed>(oSource, std::uint64_t{i} * nSourcePitch * 8, destination + i * nDestinationPitch,
+                              nRowSamples, nBits, bSigned);
+    };
     switch (GetContainerBytes(nBits))
     {
     case 1:
-        return UnpackRows<std::int8_t>(oSource, nSourcePitch, destination, nDestinationPitch, nRowSamples, nRows, nBits,
-                                       bSigned);
+        return Unpack(std::int8_t());
     case 2:
-        return UnpackRows<std::int16_t>(oSource, nSourcePitch, destination, nDestinationPitch, nRowSamples, nRows,
-                                        nBits, bSigned);
+        return Unpack(std::int16_t());
     case 4:
-        return UnpackRows<std::int32_t>(oSource, nSourcePitch, destination, nDestinationPitch, nRowSamples, nRows,
-                                        nBits, bSigned);
+        return Unpack(std::int32_t());
     default:
-        return UnpackRows<std::int64_t>(oSource, nSourcePitch, destination, nDestinationPitch, nRowSamples, nRows,
-                                        nBits, bSigned);
+        return Unpack(std::int64_t());
     }
 }
 

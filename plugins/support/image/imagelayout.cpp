@@ -18,11 +18,6 @@ void CheckSize(unsigned int nSize, const char* pWhat, const Place& oPlace)
         throw DataException(std::string("The ") + pWhat + " " + std::to_string(nSize) + " is out of range", oPlace);
 }
 
-unsigned int CountBlocks(unsigned int nSize, unsigned int nBlock)
-{
-    return (nSize - 1) / nBlock + 1;
-}
-
 } // namespace
 
 ImageLayout::ImageLayout(unsigned int nWidth, unsigned int nHeight, unsigned int nBlockWidth, unsigned int nBlockHeight,
@@ -34,8 +29,7 @@ ImageLayout::ImageLayout(unsigned int nWidth, unsigned int nHeight, unsigned int
     CheckSize(nHeight, "image height", oPlace);
     CheckSize(nBlockWidth, "block width", oPlace);
     CheckSize(nBlockHeight, "block height", oPlace);
-    mnBlocksAcross = CountBlocks(nWidth, nBlockWidth);
-    mnBlocksDown = CountBlocks(nHeight, nBlockHeight);
+    mnBlocksAcross = (nWidth - 1) / nBlockWidth + 1;
     if (moPlanes.empty())
         throw DataException("The image has no channels", oPlace);
     moFirstChannels.reserve(moPlanes.size() + 1);

@@ -47,7 +47,6 @@ public:
     unsigned int GetBlockWidth() const { return mnBlockWidth; }
     unsigned int GetBlockHeight() const { return mnBlockHeight; }
     unsigned int GetBlocksAcross() const { return mnBlocksAcross; }
-    unsigned int GetBlocksDown() const { return mnBlocksDown; }
 
     // The size that readers are told to use; the block's unless set.
     void SetPreferredBlock(unsigned int nWidth, unsigned int nHeight);
@@ -81,7 +80,6 @@ private:
     unsigned int mnPreferredWidth;
     unsigned int mnPreferredHeight;
     unsigned int mnBlocksAcross;
-    unsigned int mnBlocksDown;
     std::vector<Plane> moPlanes;
     std::vector<unsigned int> moFirstChannels; // of each plane, and the count of all at the end
     std::vector<std::size_t> maPixelBytes;

@@ -1,13 +1,10 @@
 #include "plugins/tif/geo/geokeys.h"
 
-#include "plugins/tif/geo/crsbuilder.h"
 #include "plugins/tif/geo/geokeylist.h"
 #include "plugins/tif/reading/tiffvalues.h"
-#include "toolkit/exceptions/exceptions.h"
 
 #include <cmath>
 #include <cstddef>
-#include <string>
 
 #include <geotiff.h>
 #include <geovalues.h>
@@ -99,27 +96,6 @@ std::vector<TiePoint> ReadTiePoints(TIFF* poFile)
             oPoints.push_back(oPoint);
     }
     return oPoints;
-}
-
-std::unique_ptr<krv::ogc::cs::ICRS> ReadCRS(TIFF* poFile, std::string* pTrouble, const krv::Place& oPlace)
-{
-    try
-    {
-        std::string damage;
-        const GeoKeyList oKeys = GeoKeyList::From(poFile, &damage);
-        if (!damage.empty())
-            throw krv::DataException("The geographic keys are damaged: " + damage, oPlace);
-        const CRSBuilder oBuilder(oKeys, oPlace);
-        const std::string contradiction = oBuilder.FindContradiction();
-        if (pTrouble != nullptr && !contradiction.empty())
-            *pTrouble = "the geographic keys contradict each other, and no reference system is taken from them: " +
-                        contradiction;
-        return oBuilder.Build();
-    }
-    catch (const krv::DataException& oException)
-    {
-        throw krv::DataException(std::string(TIFFFileName(poFile)) + ": " + oException.GetMessage(), oPlace);
-    }
 }
 
 } // namespace krv::plugins::tif

@@ -82,19 +82,9 @@ void Append(std::vector<unsigned char>& oStream, Bytes oTable, bool bHuffman)
 
 Bytes GetStandardTable(unsigned int nTable)
 {
-    switch (nTable)
-    {
-    case JpegHeader::eDc:
-        return BRIGHTNESS_DC;
-    case JpegHeader::eDc + 1:
-        return COLOUR_DC;
-    case JpegHeader::eAc:
-        return BRIGHTNESS_AC;
-    case JpegHeader::eAc + 1:
-        return COLOUR_AC;
-    default:
-        return {};
-    }
+    constexpr Bytes STANDARD[] = {BRIGHTNESS_DC, COLOUR_DC, BRIGHTNESS_AC, COLOUR_AC};
+    const bool bKnown = nTable >= JpegHeader::eDc && nTable % JpegHeader::PLACES < 2;
+    return bKnown ? STANDARD[(nTable - JpegHeader::eDc) / 2 + nTable % 2] : Bytes();
 }
 
 bool JpegHeader::ReadTables(Bytes oSegment, bool bHuffman)

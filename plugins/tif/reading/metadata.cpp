@@ -20,12 +20,7 @@ namespace
 
 using krv::datasources::AuxiliaryData;
 
-constexpr std::uint32_t TAG_METADATA = 42112;
-constexpr std::uint32_t TAG_NO_DATA = 42113;
-constexpr std::uint32_t TAG_RPC = 50844;
 constexpr std::uint32_t TAG_GEO_KEYS = 34735;
-constexpr std::size_t RPC_VALUES = 92;
-constexpr std::size_t MAXIMUM_XMP_BYTES = std::size_t{1} << 20;
 
 void SetText(AuxiliaryData& oData, const char* pKey, const std::string& text)
 {
@@ -35,29 +30,16 @@ void SetText(AuxiliaryData& oData, const char* pKey, const std::string& text)
 
 void ReadBaseline(TIFF* poTiff, AuxiliaryData& oData)
 {
-    constexpr std::pair<std::uint32_t, const char*> TEXTS[] = {
-        {TIFFTAG_IMAGEDESCRIPTION, "ImageDescription"},
-        {TIFFTAG_DOCUMENTNAME, "DocumentName"},
-        {TIFFTAG_PAGENAME, "PageName"},
-        {TIFFTAG_MAKE, "Make"},
-        {TIFFTAG_MODEL, "Model"},
-        {TIFFTAG_SOFTWARE, "Software"},
-        {TIFFTAG_DATETIME, "DateTime"},
-        {TIFFTAG_ARTIST, "Artist"},
-        {TIFFTAG_HOSTCOMPUTER, "HostComputer"},
-        {TIFFTAG_COPYRIGHT, "Copyright"},
-    };
-    for (const auto& [nTag, pKey] : TEXTS)
-        SetText(oData, pKey, ReadText(poTiff, nTag));
-    const std::string xmp = ReadText(poTiff, TIFFTAG_XMLPACKET);
-    if (xmp.size() <= MAXIMUM_XMP_BYTES)
-        SetText(oData, "XMP", xmp);
-    SetText(oData, "NO_DATA_VALUE", ReadText(poTiff, TAG_NO_DATA));
+    for (const auto& [pKey, nTag] : TEXTS)
+    {
+        const std::string text = ReadText(poTiff, nTag);
+        if (nTag != TIFFTAG_XMLPACKET || text.size() <= MAXIMUM_XMP_BYTES)
+            SetText(oData, pKey, text);
+    }
 }
 
 void ReadResolution(TIFF* poTiff, AuxiliaryData& oData)
 {
-    constexpr const char* UNITS[] = {"", "none", "inch", "centimetre"};
     float nResolution = 0;
     bool bAny = false;
     if (TIFFGetField(poTiff, TIFFTAG_XRESOLUTION, &nResolution) == 1)
@@ -65,8 +47,9 @@ void ReadResolution(TIFF* poTiff, AuxiliaryData& oData)
     if (TIFFGetField(poTiff, TIFFTAG_YRESOLUTION, &nResolution) == 1)
         SetText(oData, "YResolution", NumberText(nResolution)), bAny = true;
     std::uint16_t nUnit = 0;
-    if (bAny && TIFFGetFieldDefaulted(poTiff, TIFFTAG_RESOLUTIONUNIT, &nUnit) == 1 && nUnit < std::size(UNITS))
-        SetText(oData, "ResolutionUnit", UNITS[nUnit]);
+    if (bAny && TIFFGetFieldDefaulted(poTiff, TIFFTAG_RESOLUTIONUNIT, &nUnit) == 1 &&
+        nUnit < std::size(RESOLUTION_UNITS))
+        SetText(oData, "ResolutionUnit", RESOLUTION_UNITS[nUnit]);
     std::uint16_t nOrientation = ORIENTATION_TOPLEFT;
     if (TIFFGetField(poTiff, TIFFTAG_ORIENTATION, &nOrientation) == 1 && nOrientation != ORIENTATION_TOPLEFT)
         SetText(oData, "Orientation", std::to_string(nOrientation));
@@ -146,12 +129,10 @@ std::optional<unsigned int> ItemChannel(const krv::xml::Element& oItem, unsigned
 
 std::string ItemKey(const krv::xml::Element& oItem)
 {
-    constexpr std::pair<std::string_view, const char*> ROLES[] = {
-        {"scale", "Scale"}, {"offset", "Offset"}, {"unittype", "UnitType"}, {"colorinterp", "ColorInterp"}};
     const std::string role = Attribute(oItem, "role");
-    for (const auto& [name, pKey] : ROLES)
-        if (role == name && oItem.FindAttribute("sample") != nullptr)
-            return pKey;
+    for (const ItemRole& oRole : ROLES)
+        if (role == oRole.mpRole && oItem.FindAttribute("sample") != nullptr)
+            return oRole.mpKey;
     const std::string domain = Attribute(oItem, "domain");
     const std::string name = Attribute(oItem, "name");
     return domain.empty() || name.empty() ? name : domain + ":" + name;

@@ -26,6 +26,45 @@ namespace krv::plugins::tif
 // value of "MetadataXML"; why it cannot be read goes to pTrouble.
 krv::datasources::AuxiliaryData ReadMetadata(Page& oPage, std::string* pTrouble = nullptr);
 
+constexpr std::uint16_t TAG_METADATA = 42112;
+constexpr std::uint16_t TAG_RPC = 50844;
+constexpr std::size_t RPC_VALUES = 92;
+constexpr std::size_t MAXIMUM_XMP_BYTES = std::size_t{1} << 20;
+constexpr const char* RESOLUTION_UNITS[] = {"", "none", "inch", "centimetre"}; // by the tag's number
+
+// The keys whose values are the texts of tags.
+struct TextTag
+{
+    const char* mpKey;
+    std::uint16_t mnTag;
+};
+
+constexpr TextTag TEXTS[] = {{"ImageDescription", TIFFTAG_IMAGEDESCRIPTION},
+                             {"DocumentName", TIFFTAG_DOCUMENTNAME},
+                             {"PageName", TIFFTAG_PAGENAME},
+                             {"Make", TIFFTAG_MAKE},
+                             {"Model", TIFFTAG_MODEL},
+                             {"Software", TIFFTAG_SOFTWARE},
+                             {"DateTime", TIFFTAG_DATETIME},
+                             {"Artist", TIFFTAG_ARTIST},
+                             {"HostComputer", TIFFTAG_HOSTCOMPUTER},
+                             {"Copyright", TIFFTAG_COPYRIGHT},
+                             {"XMP", TIFFTAG_XMLPACKET},
+                             {"NO_DATA_VALUE", 42113}};
+
+// The keys of channels whose items have roles, and the names of such items.
+struct ItemRole
+{
+    const char* mpKey;
+    const char* mpName;
+    const char* mpRole;
+};
+
+constexpr ItemRole ROLES[] = {{"Scale", "SCALE", "scale"},
+                              {"Offset", "OFFSET", "offset"},
+                              {"UnitType", "UNITTYPE", "unittype"},
+                              {"ColorInterp", "COLORINTERP", "colorinterp"}};
+
 // A place in the record: a tag of the file (channel 0) or of a channel, or a channel's description. Ordered as the
 // record orders its keys, so that two that differ in letter case alone are one place.
 struct MetadataKey

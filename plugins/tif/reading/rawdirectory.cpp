@@ -54,18 +54,8 @@ std::size_t GetTypeBytes(std::uint16_t nType)
 
 bool IsWholeType(std::uint16_t nType)
 {
-    switch (nType)
-    {
-    case 1: // unsigned of 8, 16, 32, 64 bits and the offsets of directories
-    case 3:
-    case 4:
-    case 13:
-    case 16:
-    case 18:
-        return true;
-    default:
-        return false;
-    }
+    constexpr std::uint16_t WHOLE[] = {TIFF_BYTE, TIFF_SHORT, TIFF_LONG, TIFF_IFD, TIFF_LONG8, TIFF_IFD8};
+    return std::find(std::begin(WHOLE), std::end(WHOLE), nType) != std::end(WHOLE);
 }
 
 std::optional<FileHeader> FileHeader::Parse(const unsigned char* pBytes, std::size_t nBytes)

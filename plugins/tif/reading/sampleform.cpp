@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <utility>
 
 #include <tiff.h>
 
@@ -48,21 +49,13 @@ bool FindInteger(SampleForm& oForm, bool bSigned, bool bComplex)
 
 bool FindReal(SampleForm& oForm, bool bComplex)
 {
-    switch (oForm.mnPartBits)
-    {
-    case 16:
-        oForm.meWidening = Widening::eHalf;
-        break;
-    case 24:
-        oForm.meWidening = Widening::eFloat24;
-        break;
-    case 32:
-    case 64:
-        oForm.meWidening = Widening::eNone;
-        break;
-    default:
+    constexpr std::pair<unsigned int, Widening> REALS[] = {
+        {16, Widening::eHalf}, {24, Widening::eFloat24}, {32, Widening::eNone}, {64, Widening::eNone}};
+    const auto* const pFound = std::find_if(std::begin(REALS), std::end(REALS),
+                                            [&](const auto& oReal) { return oReal.first == oForm.mnPartBits; });
+    if (pFound == std::end(REALS))
         return false;
-    }
+    oForm.meWidening = pFound->second;
     oForm.moType = MakeType(std::max(32u, oForm.mnPartBits), true, true, bComplex);
     oForm.moNativeType = MakeType(oForm.mnPartBits, true, true, bComplex);
     return true;
@@ -106,24 +99,11 @@ bool FindSampleForm(unsigned int nBits, unsigned int nFormat, SampleForm& oForm,
     const bool bComplex = nFormat == SAMPLEFORMAT_COMPLEXINT || nFormat == SAMPLEFORMAT_COMPLEXIEEEFP;
     oForm.mnParts = bComplex ? 2 : 1;
     oForm.mnPartBits = nBits / oForm.mnParts;
-    bool bFound = nBits > 0 && nBits % oForm.mnParts == 0;
-    switch (nFormat)
-    {
-    case SAMPLEFORMAT_UINT:
-    case SAMPLEFORMAT_VOID:
-        bFound = bFound && FindInteger(oForm, false, false);
-        break;
-    case SAMPLEFORMAT_INT:
-    case SAMPLEFORMAT_COMPLEXINT:
-        bFound = bFound && FindInteger(oForm, true, bComplex);
-        break;
-    case SAMPLEFORMAT_IEEEFP:
-    case SAMPLEFORMAT_COMPLEXIEEEFP:
-        bFound = bFound && FindReal(oForm, bComplex);
-        break;
-    default:
-        bFound = false;
-    }
+    const bool bReal = nFormat == SAMPLEFORMAT_IEEEFP || nFormat == SAMPLEFORMAT_COMPLEXIEEEFP;
+    const bool bSigned = nFormat == SAMPLEFORMAT_INT || nFormat == SAMPLEFORMAT_COMPLEXINT;
+    const bool bFound = nBits > 0 && nBits % oForm.mnParts == 0 && nFormat >= SAMPLEFORMAT_UINT &&
+                        nFormat <= SAMPLEFORMAT_COMPLEXIEEEFP &&
+                        (bReal ? FindReal(oForm, bComplex) : FindInteger(oForm, bSigned, bComplex));
     if (!bFound)
         reason = "samples of " + std::to_string(nBits) + " bits in sample format " + std::to_string(nFormat) +
                  " cannot be read";

@@ -116,9 +116,11 @@ void StrileSource::ReadStrips(const support::BlockAddress& oBlock, const support
 std::uint32_t StrileSource::ReadPiece(const Piece& oPiece, std::uint32_t nRowsWanted)
 {
     const Strile oStrile = mpoPage->GetStriles().Get(oPiece.mnStrile);
-    std::uint32_t nRows = oPiece.moWanted.mnRows;
+    const auto [nWidth, nWanted, pTarget, nPitch] = oPiece.moWanted;
+    std::uint32_t nRows = nWanted;
     if (!oStrile.IsStored())
-        Clear(oPiece.moWanted);
+        for (std::uint32_t nRow = 0; nRow < nWanted; ++nRow)
+            std::memset(pTarget + nRow * nPitch, 0, moForm.GetRowBytes(nWidth));
     else if (oStrile.mnOffset == 0)
         mpoPage->Fail(moDecoder.Describe(oPiece.mnStrile) + ": its offset is 0");
     else if (mbPlain)
@@ -126,7 +128,9 @@ std::uint32_t StrileSource::ReadPiece(const Piece& oPiece, std::uint32_t nRowsWa
     else
         ReadCoded(oPiece, oStrile);
     if (meUse == PixelUse::eBitmap && (moForm.moSample.GetBits() != 1 || moForm.moSample.IsSigned()))
-        ToBits({oPiece.moWanted.mnWidth, nRows, oPiece.moWanted.mpTarget, oPiece.moWanted.mnPitch});
+        for (std::uint32_t nRow = 0; nRow < nRows; ++nRow)
+            for (std::uint32_t nAt = 0; nAt < nWidth; ++nAt)
+                pTarget[nRow * nPitch + nAt] = pTarget[nRow * nPitch + nAt] != 0;
     return nRows;
 }
 
@@ -162,44 +166,23 @@ std::uint32_t StrileSource::ReadPlain(Piece oPiece, const Strile& oStrile, std::
         oWanted.mnRows += oPiece.moWanted.mnRows;
         nNext += oPiece.mnStoredRows * nPitch;
     }
-    if (moForm.moSample.IsWhole())
-        ReadPlainRows(nOffset, oPiece.mnX, oWanted);
-    else
-        ReadPackedRows(nOffset, oPiece.mnX, oWanted);
+    ReadRows(nOffset, oPiece.mnX, oWanted);
     return oWanted.mnRows;
 }
 
-void StrileSource::ReadPlainRows(std::uint64_t nOffset, unsigned int nX, const WantedPixels& oWanted)
+// Eight pixels of any width end with a byte: packed rows are taken from such a pixel on, and the first few dropped.
+void StrileSource::ReadRows(std::uint64_t nOffset, unsigned int nX, const WantedPixels& oWanted)
 {
     const std::size_t nStoredPitch = moForm.GetStoredRowBytes(moForm.mnStrileWidth);
-    const std::size_t nPixelBytes = moForm.GetPlaneChannels() * moForm.moSample.GetBits() / 8;
-    const std::size_t nRowBytes = oWanted.mnWidth * nPixelBytes;
-    nOffset += nX * nPixelBytes;
+    const std::uint32_t nSkip = moForm.moSample.IsWhole() ? 0 : nX % 8;
+    const std::size_t nRowBytes = moForm.GetStoredRowBytes(nSkip + oWanted.mnWidth);
+    nOffset += moForm.GetStoredRowBytes(nX - nSkip);
     if (moForm.moSample.meWidening == Widening::eNone)
     {
         mpoPage->GetFile().ReadRows(nOffset, nStoredPitch, nRowBytes, oWanted.mnRows, oWanted.mpTarget, oWanted.mnPitch,
                                     moRows);
         return moDecoder.Convert(oWanted.mpTarget, oWanted.mnPitch, oWanted);
     }
-    const auto nSlice = static_cast<std::uint32_t>(std::max<std::size_t>(1, SLICE_BYTES / nRowBytes));
-    unsigned char* pStored = moPacked.Get(std::min(nSlice, oWanted.mnRows) * nRowBytes);
-    for (std::uint32_t nRow = 0; nRow < oWanted.mnRows; nRow += nSlice)
-    {
-        const std::uint32_t nRows = std::min(nSlice, oWanted.mnRows - nRow);
-        mpoPage->GetFile().ReadRows(nOffset + nRow * std::uint64_t{nStoredPitch}, nStoredPitch, nRowBytes, nRows,
-                                    pStored, nRowBytes, moRows);
-        moDecoder.Convert(pStored, nRowBytes,
-                          {oWanted.mnWidth, nRows, oWanted.mpTarget + nRow * oWanted.mnPitch, oWanted.mnPitch});
-    }
-}
-
-// Eight pixels of any width end with a byte: rows are taken from such a pixel on, and the first few dropped.
-void StrileSource::ReadPackedRows(std::uint64_t nOffset, unsigned int nX, const WantedPixels& oWanted)
-{
-    const std::size_t nStoredPitch = moForm.GetStoredRowBytes(moForm.mnStrileWidth);
-    const std::uint32_t nSkip = nX % 8;
-    const std::size_t nRowBytes = moForm.GetStoredRowBytes(nSkip + oWanted.mnWidth);
-    nOffset += moForm.GetStoredRowBytes(nX - nSkip);
     const std::size_t nWidePitch = moForm.GetRowBytes(nSkip + oWanted.mnWidth);
     const auto nSlice = static_cast<std::uint32_t>(std::max<std::size_t>(1, SLICE_BYTES / nRowBytes));
     unsigned char* pStored = moPacked.Get(std::min(nSlice, oWanted.mnRows) * nRowBytes);
@@ -271,23 +254,6 @@ void StrileSource::ReadCoded(const Piece& oPiece, const Strile& oStrile)
                          oWanted.mnPitch, moForm.GetRowBytes(oWanted.mnWidth), oWanted.mnRows);
     }
     moDecoder.Relax();
-}
-
-void StrileSource::Clear(const WantedPixels& oWanted) const
-{
-    const std::size_t nBytes = moForm.GetRowBytes(oWanted.mnWidth);
-    for (std::uint32_t nRow = 0; nRow < oWanted.mnRows; ++nRow)
-        std::memset(oWanted.mpTarget + nRow * oWanted.mnPitch, 0, nBytes);
-}
-
-void StrileSource::ToBits(const WantedPixels& oWanted) const
-{
-    for (std::uint32_t nRow = 0; nRow < oWanted.mnRows; ++nRow)
-    {
-        unsigned char* pRow = oWanted.mpTarget + nRow * oWanted.mnPitch;
-        for (std::uint32_t nAt = 0; nAt < oWanted.mnWidth; ++nAt)
-            pRow[nAt] = pRow[nAt] != 0;
-    }
 }
 
 } // namespace krv::plugins::tif

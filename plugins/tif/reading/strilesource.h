@@ -60,14 +60,11 @@ private:
                     std::size_t nPitch);
     // Reads what it can at once and returns the number of rows: all of the first strip at least.
     std::uint32_t ReadPiece(const Piece& oPiece, std::uint32_t nRowsWanted);
-    void ReadPlainRows(std::uint64_t nOffset, unsigned int nX, const WantedPixels& oWanted);
-    void ReadPackedRows(std::uint64_t nOffset, unsigned int nX, const WantedPixels& oWanted);
+    void ReadRows(std::uint64_t nOffset, unsigned int nX, const WantedPixels& oWanted);
     std::uint32_t ReadPlain(Piece oPiece, const Strile& oStrile, std::uint32_t nRowsWanted);
     void ReadCoded(const Piece& oPiece, const Strile& oStrile);
     unsigned char* ReadRaw(const Piece& oPiece, const Strile& oStrile);
     void CheckPlainBytes(const Piece& oPiece, const Strile& oStrile) const;
-    void Clear(const WantedPixels& oWanted) const;
-    void ToBits(const WantedPixels& oWanted) const;
 
     std::shared_ptr<Page> mpoPage;
     const PageForm& moForm;

@@ -29,9 +29,8 @@ StrileArray::StrileArray(const support::File& oFile, const DirectoryEntry& oEntr
     : mnCount(oEntry.mnCount), mnOffset(oEntry.mnOffset), mnValueBytes(GetTypeBytes(oEntry.mnType)),
       mbBigEndian(bBigEndian), moPages(PAGES)
 {
-    const bool bWhole = oEntry.mnType == TIFF_BYTE || oEntry.mnType == TIFF_SHORT || oEntry.mnType == TIFF_LONG ||
-                        oEntry.mnType == TIFF_LONG8 || oEntry.mnType == TIFF_IFD || oEntry.mnType == TIFF_IFD8 ||
-                        oEntry.mnType == TIFF_SLONG || oEntry.mnType == TIFF_SLONG8 || oEntry.mnType == TIFF_SSHORT;
+    const bool bWhole = IsWholeType(oEntry.mnType) || oEntry.mnType == TIFF_SSHORT || oEntry.mnType == TIFF_SLONG ||
+                        oEntry.mnType == TIFF_SLONG8;
     if (!bWhole)
         throw FileFormatException(oFile.GetName(), oFile.GetName() + ": tag " + std::to_string(oEntry.mnTag) +
                                                        " holds no whole numbers");

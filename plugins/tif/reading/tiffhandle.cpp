@@ -31,99 +31,93 @@ struct TiffHandle::Client
 
     static Client& From(thandle_t pClient) { return *static_cast<Client*>(pClient); }
 
-    static tmsize_t Read(thandle_t pClient, void* pTarget, tmsize_t nBytes) noexcept;
     static tmsize_t Write(thandle_t, void*, tmsize_t) noexcept { return -1; }
-    static toff_t Seek(thandle_t pClient, toff_t nOffset, int nWhence) noexcept;
     static int Close(thandle_t) noexcept { return 0; }
     static toff_t Size(thandle_t pClient) noexcept { return From(pClient).moReader.GetFile().GetSize(); }
     static int Map(thandle_t, void**, toff_t*) noexcept { return 0; }
     static void Unmap(thandle_t, void*, toff_t) noexcept {}
-    void Note(const char* pText, bool bWarning) noexcept;
-    static int OnError(TIFF*, void* pClient, const char* pModule, const char* pFormat, va_list oArguments) noexcept;
-    static int OnWarning(TIFF*, void* pClient, const char* pModule, const char* pFormat, va_list oArguments) noexcept;
-};
 
-tmsize_t TiffHandle::Client::Read(thandle_t pClient, void* pTarget, tmsize_t nBytes) noexcept
-{
-    Client& oClient = From(pClient);
-    try
+    static tmsize_t Read(thandle_t pClient, void* pTarget, tmsize_t nBytes) noexcept
     {
-        auto* pBytes = static_cast<unsigned char*>(pTarget);
-        std::size_t nLeft = static_cast<std::size_t>(std::max<tmsize_t>(nBytes, 0));
-        const std::uint64_t nBegin = oClient.mnPosition;
-        if (nBegin < oClient.mnHeaderBytes)
+        Client& oClient = From(pClient);
+        try
         {
-            const auto nCopy = std::min<std::size_t>(nLeft, oClient.mnHeaderBytes - nBegin);
-            std::memcpy(pBytes, oClient.maHeader + nBegin, nCopy);
-            pBytes += nCopy;
-            nLeft -= nCopy;
-            oClient.mnPosition += nCopy;
+            auto* pBytes = static_cast<unsigned char*>(pTarget);
+            std::size_t nLeft = static_cast<std::size_t>(std::max<tmsize_t>(nBytes, 0));
+            const std::uint64_t nBegin = oClient.mnPosition;
+            if (nBegin < oClient.mnHeaderBytes)
+            {
+                const auto nCopy = std::min<std::size_t>(nLeft, oClient.mnHeaderBytes - nBegin);
+                std::memcpy(pBytes, oClient.maHeader + nBegin, nCopy);
+                pBytes += nCopy;
+                nLeft -= nCopy;
+                oClient.mnPosition += nCopy;
+            }
+            if (nLeft > 0)
+                oClient.mnPosition += oClient.moReader.Read(oClient.mnPosition, pBytes, nLeft);
+            return static_cast<tmsize_t>(oClient.mnPosition - nBegin);
         }
-        if (nLeft > 0)
-            oClient.mnPosition += oClient.moReader.Read(oClient.mnPosition, pBytes, nLeft);
-        return static_cast<tmsize_t>(oClient.mnPosition - nBegin);
+        catch (const std::exception& oException)
+        {
+            if (oClient.maCause[0] == '\0')
+                std::snprintf(oClient.maCause, sizeof(oClient.maCause), "%s", oException.what());
+        }
+        return -1;
     }
-    catch (const std::exception& oException)
+
+    static toff_t Seek(thandle_t pClient, toff_t nOffset, int nWhence) noexcept
     {
-        if (oClient.maCause[0] == '\0')
-            std::snprintf(oClient.maCause, sizeof(oClient.maCause), "%s", oException.what());
+        Client& oClient = From(pClient);
+        std::uint64_t nBase = 0;
+        if (nWhence == SEEK_CUR)
+            nBase = oClient.mnPosition;
+        else if (nWhence == SEEK_END)
+            nBase = Size(pClient);
+        oClient.mnPosition = nBase + nOffset;
+        return oClient.mnPosition;
     }
-    return -1;
-}
 
-toff_t TiffHandle::Client::Seek(thandle_t pClient, toff_t nOffset, int nWhence) noexcept
-{
-    Client& oClient = From(pClient);
-    std::uint64_t nBase = 0;
-    if (nWhence == SEEK_CUR)
-        nBase = oClient.mnPosition;
-    else if (nWhence == SEEK_END)
-        nBase = Size(pClient);
-    oClient.mnPosition = nBase + nOffset;
-    return oClient.mnPosition;
-}
-
-void TiffHandle::Client::Note(const char* pText, bool bWarning) noexcept
-{
-    const std::string_view text = pText;
-    // Bytes that some writers pad a stream with; the decoder passes over them.
-    if (bWarning && text.find("extraneous bytes before marker") != std::string_view::npos)
-        return;
-    mbLostData = true;
-    for (const char* pWords : {"not supported", "nsupported", "not configured", "mplemented"})
-        mbUnknownKind |= text.find(pWords) != std::string_view::npos;
-    try
+    void Note(const char* pText, bool bWarning) noexcept
     {
-        if (krv::nspio::Debugger::GetLevel() != 0)
-            krv::nspio::Debugger::Debug(1, "libtiff", moReader.GetFile().GetName() + ": " + pText,
-                                        "plugins/tif/reading/tiffhandle", __LINE__);
+        const std::string_view text = pText;
+        // Bytes that some writers pad a stream with; the decoder passes over them.
+        if (bWarning && text.find("extraneous bytes before marker") != std::string_view::npos)
+            return;
+        mbLostData = true;
+        for (const char* pWords : {"not supported", "nsupported", "not configured", "mplemented"})
+            mbUnknownKind |= text.find(pWords) != std::string_view::npos;
+        try
+        {
+            if (krv::nspio::Debugger::GetLevel() != 0)
+                krv::nspio::Debugger::Debug(1, "libtiff", moReader.GetFile().GetName() + ": " + pText,
+                                            "plugins/tif/reading/tiffhandle", __LINE__);
+        }
+        catch (...)
+        {
+            // No exception may pass through libtiff.
+        }
     }
-    catch (...)
+
+    static int OnError(TIFF*, void* pClient, const char*, const char* pFormat, va_list oArguments) noexcept
     {
-        // No exception may pass through libtiff.
-    }
-}
-
-int TiffHandle::Client::OnError(TIFF*, void* pClient, const char*, const char* pFormat, va_list oArguments) noexcept
-{
-    char aText[512];
-    std::vsnprintf(aText, sizeof(aText), pFormat, oArguments);
-    static_cast<Client*>(pClient)->Note(aText, false);
-    return 1;
-}
-
-// Fax and JPEG go on after data that end early or make no sense, with pixels of their own, and only warn.
-int TiffHandle::Client::OnWarning(TIFF*, void* pClient, const char* pModule, const char* pFormat,
-                                  va_list oArguments) noexcept
-{
-    const std::string_view module = pModule != nullptr ? pModule : "";
-    if (!module.starts_with("Fax") && !module.starts_with("JPEG"))
+        char aText[512];
+        std::vsnprintf(aText, sizeof(aText), pFormat, oArguments);
+        static_cast<Client*>(pClient)->Note(aText, false);
         return 1;
-    char aText[512];
-    std::vsnprintf(aText, sizeof(aText), pFormat, oArguments);
-    static_cast<Client*>(pClient)->Note(aText, true);
-    return 1;
-}
+    }
+
+    // Fax and JPEG go on after data that end early or make no sense, with pixels of their own, and only warn.
+    static int OnWarning(TIFF*, void* pClient, const char* pModule, const char* pFormat, va_list oArguments) noexcept
+    {
+        const std::string_view module = pModule != nullptr ? pModule : "";
+        if (!module.starts_with("Fax") && !module.starts_with("JPEG"))
+            return 1;
+        char aText[512];
+        std::vsnprintf(aText, sizeof(aText), pFormat, oArguments);
+        static_cast<Client*>(pClient)->Note(aText, true);
+        return 1;
+    }
+};
 
 void TiffHandle::Forget()
 {

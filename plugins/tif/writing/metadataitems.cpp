@@ -6,6 +6,7 @@
 #include <cstdint>
 #include <optional>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 namespace krv::plugins::tif
@@ -18,18 +19,6 @@ using krv::xml::Element;
 
 constexpr const char* ROOT = "GDALMetadata";
 constexpr std::string_view HEX = "0123456789abcdef";
-
-struct Role
-{
-    const char* mpKey;
-    const char* mpName;
-    const char* mpRole;
-};
-
-constexpr Role ROLES[] = {{"Scale", "SCALE", "scale"},
-                          {"Offset", "OFFSET", "offset"},
-                          {"UnitType", "UNITTYPE", "unittype"},
-                          {"ColorInterp", "COLORINTERP", "colorinterp"}};
 
 // Length of the character of UTF-8 at a place; 0 when there is none that XML takes.
 std::size_t CharacterBytes(std::string_view text, std::size_t nAt)
@@ -83,34 +72,18 @@ std::string MakeLikeness(std::string_view text)
 
 std::string Escape(std::string_view text, bool bAttribute)
 {
+    // The last three only where they would end an attribute or become blanks in it.
+    constexpr std::pair<char, std::string_view> ESCAPES[] = {{'&', "&amp;"},  {'<', "&lt;"},   {'>', "&gt;"},
+                                                             {'\r', "&#13;"}, {'"', "&quot;"}, {'\n', "&#10;"},
+                                                             {'\t', "&#9;"}};
+    const auto* const pEnd = std::end(ESCAPES) - (bAttribute ? 0 : 3);
     std::string result;
     for (const char nCharacter : text)
-        switch (nCharacter)
-        {
-        case '&':
-            result += "&amp;";
-            break;
-        case '<':
-            result += "&lt;";
-            break;
-        case '>':
-            result += "&gt;";
-            break;
-        case '\r':
-            result += "&#13;";
-            break;
-        case '"':
-            result += bAttribute ? "&quot;" : "\"";
-            break;
-        case '\n':
-            result += bAttribute ? "&#10;" : "\n";
-            break;
-        case '\t':
-            result += bAttribute ? "&#9;" : "\t";
-            break;
-        default:
-            result += nCharacter;
-        }
+    {
+        const auto* const pFound =
+            std::find_if(std::begin(ESCAPES), pEnd, [&](const auto& oEscape) { return oEscape.first == nCharacter; });
+        result += pFound == pEnd ? std::string_view(&nCharacter, 1) : pFound->second;
+    }
     return result;
 }
 
@@ -157,7 +130,7 @@ Element MakeItem(const MetadataKey& oKey, const std::string& value)
     oItem.name = "Item";
     std::string name = oKey.mbDescription ? "DESCRIPTION" : MakeLikeness(oKey.moKey);
     std::string role = oKey.mbDescription ? "description" : "";
-    for (const Role& oRole : ROLES)
+    for (const ItemRole& oRole : ROLES)
         if (oKey.mnChannel != 0 && !oKey.mbDescription && IsSameKey(oKey.moKey, oRole.mpKey))
             name = oRole.mpName, role = oRole.mpRole;
     const std::size_t nColon = name.find(':');

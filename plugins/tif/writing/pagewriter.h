@@ -30,7 +30,6 @@ public:
     bool ReadsParts() const override { return moReader.ReadsParts(); }
     bool SparesParts() const override { return moReader.SparesParts(); }
     std::string GetName() const override { return mpoEditor->GetFileName(); }
-    PageModel& GetModel() { return *mpoModel; }
 
     void ReadBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
                    std::size_t nPitch) override;

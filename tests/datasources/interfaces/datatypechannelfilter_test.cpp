@@ -45,13 +45,8 @@ TEST(DataTypeChannelFilter, ComparesAllSixFields)
     }
 }
 
-TEST(FileFormat, CopiesBothMembersAndFlagsKeepTheirValues)
+TEST(FileFormat, FlagsKeepTheirValues)
 {
-    krv::test::SimpleFormat oFirst("FIRST");
-    const krv::test::SimpleFormat oSecond("SECOND");
-    oFirst.Assignment(oSecond);
-    EXPECT_EQ(oFirst.GetShortName(), "SECOND");
-    EXPECT_EQ(krv::test::SimpleFormat(oFirst).GetExtensions(), std::vector<std::string>{"test"});
     EXPECT_EQ(eReadOnly, 0);
     EXPECT_EQ(eUpdate, 1);
     EXPECT_EQ(eDone, 0);

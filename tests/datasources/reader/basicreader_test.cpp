@@ -18,6 +18,7 @@ class BasicReaderTest : public ReaderTest
 {
 protected:
     using ReaderPtr = std::unique_ptr<BasicReader>;
+    const Channels ALL{3, 1, 2}, NONE, BITMAPS{7, 2};
 
     struct Constructor
     {
@@ -34,12 +35,12 @@ protected:
             {"file and channels",
              [this]
              {
-                 return New(moFile, Channels{3, 1, 2});
+                 return New(moFile, ALL);
              }},
             {"file and no channels",
              [this]
              {
-                 return New(moFile, Channels{});
+                 return New(moFile, NONE);
              }},
             {"file and filter",
              [this]
@@ -49,17 +50,17 @@ protected:
             {"bitmaps",
              [this]
              {
-                 return New(dynamic_cast<IBitmapDataset*>(mpoOpen.get()), Channels{7, 2}, false);
+                 return New(dynamic_cast<IBitmapDataset*>(mpoOpen.get()), BITMAPS, false);
              }},
             {"dataset",
              [this]
              {
-                 return New(mpoOpen.get(), Channels{2, 2, 3}, false);
+                 return New(mpoOpen.get(), ALL, false);
              }},
             {"own dataset",
              [this]
              {
-                 auto oReader = New(mpoOpen.get(), Channels{}, true);
+                 auto oReader = New(mpoOpen.get(), NONE, true);
                  [[maybe_unused]] IDataset* const poTakenOver = mpoOpen.release();
                  return oReader;
              }},

@@ -2,7 +2,6 @@
 
 #include "datasources/reader/defaultreader.h"
 #include "datasources/reader/exacthaloreader.h"
-#include "datasources/reader/multitypeoverviewreaderaccessor.h"
 #include "tests/datasources/reader/readertest.h"
 #include "tests/support/outputcapture.h"
 
@@ -29,6 +28,7 @@ protected:
 TEST_F(MultiTypeReaderTest, TypesArePromotedOrRequestedWithAWarning)
 {
     const auto dataset = MakeDataset();
+    EXPECT_THROW(BasicReader{moFile}, krv::DataException); // all channels at once are of several types
     EXPECT_EQ(MultiTypeReader(dataset.get(), {1, 2}).GetDataType(), DataType(krv::gobs::eDT_16U));
     EXPECT_EQ(MultiTypeReader(dataset.get(), {1, 3}).GetDataType(), DataType(krv::gobs::eDT_8U));
     OutputCapture oOutput;
@@ -69,19 +69,6 @@ TEST_F(MultiTypeReaderTest, RefusalsSayWhatIsWrong)
         return std::make_unique<DatasetWithoutRaster>(moModel);
     };
     EXPECT_EQ(Error([&] { MultiTypeReader(moFile, {1}); }), "data: Format does not support rasters: file=" + moFile);
-}
-
-TEST_F(MultiTypeReaderTest, LevelsAndReadyMadeReadersMakeOneImage)
-{
-    moModel->moLevels = {2};
-    const auto dataset = MakeDataset();
-    MultiTypeReader oReader(dataset.get(), {1, 2, 3}, krv::gobs::eDT_32R, krv::datasources::eOwnPlace);
-    const std::unique_ptr<krv::datasources::IOverviewReaderAccessor> oLevels(oReader.GetOverviewReaderAccessor());
-    ASSERT_EQ(oLevels->GetLevels(), std::vector<unsigned int>{2});
-    const std::unique_ptr<IRasterReader> oLevel(oLevels->CreateRasterReader(2));
-    EXPECT_EQ(oLevel->GetWidth(), moModel->LevelWidth(2));
-    EXPECT_EQ(oLevel->GetDataType(), DataType(krv::gobs::eDT_32R));
-    EXPECT_EQ(oLevel->GetOverviewReaderAccessor(), nullptr);
 }
 
 // Refuses a tile width of 13.

@@ -108,36 +108,22 @@ TEST(LzwDecoder, TakesHostileInputAsTheTextbookDoes)
     for (unsigned int nSeed = 0; nSeed < 1500; ++nSeed)
     {
         std::mt19937 oRandom(nSeed);
-        const Bytes oData = krv::test::MakeData(oRandom, nSeed, 1 + oRandom() % 1200);
+        const Bytes oData = krv::test::MakeData(oRandom, nSeed, 1 + oRandom() % (nSeed % 10 == 1 ? 9000 : 1200));
         Bytes oInput =
             nSeed % 3 == 0 ? krv::test::RandomBytes(oRandom, oRandom() % 3000) : Encode(oData, nSeed % 5 == 0);
+        if (nSeed % 3 != 0) // sound as yet
+        {
+            Bytes oBack(oData.size());
+            EXPECT_EQ(LzwDecoder::IsOldStyle(oInput.data(), oInput.size()), nSeed % 5 == 0);
+            EXPECT_TRUE(oDecoder.Decode(oInput.data(), oInput.size(), oBack.data(), oBack.size()).IsDone());
+            EXPECT_TRUE(oBack == oData) << "seed " << nSeed;
+        }
         for (unsigned int nFlips = oRandom() % 4; nFlips > 0 && !oInput.empty(); --nFlips)
             oInput[oRandom() % oInput.size()] ^= static_cast<unsigned char>(1U << oRandom() % 8);
         if (nSeed % 4 == 0)
             oInput.resize(oRandom() % (oInput.size() + 1));
         ExpectAsTextbook(oDecoder, oInput, oRandom() % 4000, "seed " + std::to_string(nSeed));
     }
-}
-
-TEST(LzwEncoder, ComesBackInBothEditions)
-{
-    for (const bool bOld : {false, true})
-        for (std::size_t nBytes : {0U, 1U, 700U, 3000U, 40000U})
-            for (const unsigned int nValues : {2U, 256U})
-            {
-                Bytes oBlock(nBytes), oBack(nBytes);
-                std::mt19937 oRandom(static_cast<unsigned int>(nBytes));
-                for (unsigned char& nByte : oBlock)
-                    nByte = static_cast<unsigned char>(oRandom() % nValues);
-                const Bytes oCoded = Encode(oBlock, bOld);
-                EXPECT_EQ(LzwDecoder::IsOldStyle(oCoded.data(), oCoded.size()), bOld);
-                LzwDecoder oDecoder;
-                EXPECT_TRUE(oDecoder.Decode(oCoded.data(), oCoded.size(), oBack.data(), nBytes).IsDone());
-                EXPECT_TRUE(nBytes < 2 ||
-                            oDecoder.Decode(oCoded.data(), oCoded.size(), oBack.data(), nBytes / 2).mbMore);
-                oDecoder.Decode(oCoded.data(), oCoded.size(), oBack.data(), nBytes);
-                EXPECT_TRUE(oBack == oBlock) << nBytes << " bytes of " << nValues << " values";
-            }
 }
 
 } // namespace

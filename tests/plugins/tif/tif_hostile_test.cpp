@@ -1,18 +1,16 @@
 #include "datasources/metadata/auxiliarydata.h"
-#include "gobs/pct/pct.h"
+#include "fuzz/support/exercise.h"
 #include "tests/plugins/tif/tifsupport.h"
 #include "tests/support/facts.h"
+#include "tests/support/outputcapture.h"
 #include "tests/support/tiffwriter.h"
 #include "toolkit/exceptions/exceptions.h"
-#include "toolkit/nspio/warning.h"
-#include "toolkit/ogc/cs/icrs.h"
 
 #include <algorithm>
 #include <cstring>
 #include <ctime>
 #include <filesystem>
 #include <fstream>
-#include <functional>
 #include <random>
 
 #include <gtest/gtest.h>
@@ -29,80 +27,33 @@ Bytes ReadBytes(const std::string& fileName)
     return {bytes.begin(), bytes.end()};
 }
 
-// Hands the warnings of its lifetime on.
-class Warnings
-{
-public:
-    explicit Warnings(std::function<void(const std::string&)> oTake)
-        : moFormer(krv::nspio::Warning::SetSink(
-              [oTake = std::move(oTake)](const std::string& message, const std::string&, unsigned int)
-              { oTake(message); }))
-    {
-    }
-    ~Warnings() { krv::nspio::Warning::SetSink(moFormer); }
-
-private:
-    krv::nspio::Warning::Sink moFormer;
-};
-
 // Of the processor: a busy machine is no fault of the format.
 double Seconds()
 {
     return static_cast<double>(std::clock()) / CLOCKS_PER_SEC;
 }
 
-// A window of at most 64 x 64 at a corner of the image, of at most four channels.
-void ReadCorner(krv::datasources::IRasterIO& oIO, std::size_t nPixelBytes, bool bLast)
-{
-    const unsigned int nWidth = std::min(64u, oIO.GetFileWidth());
-    const unsigned int nHeight = std::min(64u, oIO.GetFileHeight());
-    Bytes oBuffer(std::size_t{nWidth} * nHeight * nPixelBytes);
-    oIO.ReadWindow(bLast ? oIO.GetFileWidth() - nWidth : 0, bLast ? oIO.GetFileHeight() - nHeight : 0, nWidth, nHeight,
-                   oBuffer.data());
-}
-
-// Asks a file everything. Returns the message of the first exception or warning; anything that is no krv::Exception
-// passes.
+// Asks a file everything. Returns what is warned of and the messages of all exceptions; anything that is no
+// krv::Exception passes.
 std::string UseFile(const std::string& fileName)
 {
-    std::string first;
-    const Warnings oWarnings(
-        [&first](const std::string& message)
-        {
-            if (first.empty())
-                first = message;
-        });
-    const auto Try = [&first](auto oStep)
+    const OutputCapture oOutput;
+    std::string messages;
+    const auto Hear = [&messages](const krv::Exception& oException)
     {
-        try
-        {
-            oStep();
-        }
-        catch (const krv::Exception& oException)
-        {
-            if (first.empty())
-                first = oException.GetMessage();
-        }
+        messages += oException.GetMessage() + "\n";
     };
-    Try(
-        [&]
-        {
-            const TifPointer oFile = OpenTif(fileName);
-            const std::vector<unsigned int> oChannels = AllChannels(std::min(4u, oFile->GetChanCount()));
-            for (const bool bLast : {false, true})
-                Try([&] { ReadCorner(*IOPointer(oFile->GetRasterIO(oChannels)), oChannels.size() * 16, bLast); });
-            Try([&] { oFile->ReadAuxiliaryData(); });
-            Try([&] { oFile->GetGeocoding(); });
-            Try([&] { delete oFile->ReadCRS(); });
-            const std::unique_ptr<krv::datasources::IOverviewManager> poManager(oFile->GetOverviewManager());
-            for (const unsigned int nLevel : poManager->GetLevels())
-                Try([&] { ReadCorner(*IOPointer(poManager->GetOverviewIO(nLevel, {1})), 16, true); });
-            for (const unsigned int nBitmap : oFile->GetBitmapList())
-                Try([&] { ReadCorner(*IOPointer(oFile->GetBitmapIO({nBitmap})), 1, true); });
-            for (const unsigned int nTable : oFile->GetPCTList())
-                Try([&] { delete oFile->GetPCT(nTable); });
-        });
-    return first;
+    try
+    {
+        krv::fuzz::ExerciseDataset(*OpenTif(fileName), Hear);
+    }
+    catch (const krv::Exception& oException)
+    {
+        Hear(oException);
+    }
+    for (const OutputCapture::Line& oLine : oOutput.moWarnings)
+        messages += oLine.moMessage + "\n";
+    return messages;
 }
 
 struct Recipe
@@ -442,16 +393,16 @@ TEST(TifHostile, ChainsOfDirectoriesThatNeverEndDoNotHang)
     }
     std::memset(&oPages[nNext], 0x7F, 4);
     WriteBytes(file, oPages);
-    std::vector<std::string> oSaid;
-    const Warnings oWarnings([&oSaid](const std::string& message) { oSaid.push_back(message); });
+    const OutputCapture oOutput;
     for (int nTime = 0; nTime < 2; ++nTime)
     {
         const TifPointer poFile = OpenTif(file);
         const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poFile->GetOverviewManager());
         EXPECT_EQ(poLevels->GetLevels(), std::vector<unsigned int>{2});
         EXPECT_TRUE(poFile->GetBitmapList().empty());
-        ASSERT_EQ(oSaid.size(), nTime + 1u);
-        EXPECT_NE(oSaid[0].find(file + ": levels and masks are listed only"), std::string::npos) << oSaid[0];
+        ASSERT_EQ(oOutput.moWarnings.size(), nTime + 1u);
+        const std::string& said = oOutput.moWarnings[0].moMessage;
+        EXPECT_NE(said.find(file + ": levels and masks are listed only"), std::string::npos) << said;
     }
     // Directories of one entry, so many as the file holds.
     Bytes oBytes = Handmade::Image(16, 16, 16, 1, 1, 400, 256).Finish(1000, 1000);
@@ -528,7 +479,7 @@ TEST(TifHostile, ATag42112ThatIsNoXmlIsNamedAndKept)
     const std::string file = oFolder.File("file.tif");
     WriteBytes(file, oBytes);
     EXPECT_NE(UseFile(file).find(file + ": tag 42112"), std::string::npos) << UseFile(file);
-    const Warnings oQuiet([](const std::string&) {});
+    const OutputCapture oQuiet;
     for (const bool bWritten : {false, true})
     {
         krv::datasources::AuxiliaryData oData = OpenTif(file)->ReadAuxiliaryData();

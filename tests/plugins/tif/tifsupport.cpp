@@ -77,20 +77,6 @@ std::vector<unsigned int> AllChannels(unsigned int nCount)
     return oChannels;
 }
 
-namespace
-{
-
-template <typename Action>
-void ForEachTile(krv::datasources::IRasterIO& oIO, Action oAction)
-{
-    for (unsigned int nY = 0; nY < oIO.GetFileHeight(); nY += oIO.GetTileHeight())
-        for (unsigned int nX = 0; nX < oIO.GetFileWidth(); nX += oIO.GetTileWidth())
-            oAction(nX, nY, std::min(oIO.GetTileWidth(), oIO.GetFileWidth() - nX),
-                    std::min(oIO.GetTileHeight(), oIO.GetFileHeight() - nY));
-}
-
-} // namespace
-
 Bytes ReadAll(krv::datasources::IRasterIO& oIO, std::size_t nPixelBytes)
 {
     const std::size_t nPitch = oIO.GetFileWidth() * nPixelBytes;
@@ -102,15 +88,17 @@ Bytes ReadAll(krv::datasources::IRasterIO& oIO, std::size_t nPixelBytes)
 void WriteAll(krv::datasources::IRasterIO& oIO, std::size_t nPixelBytes, const Bytes& oPixels)
 {
     const std::size_t nPitch = oIO.GetFileWidth() * nPixelBytes;
-    ForEachTile(oIO,
-                [&](unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight)
-                {
-                    Bytes oTile(nWidth * nHeight * nPixelBytes);
-                    for (unsigned int nRow = 0; nRow < nHeight; ++nRow)
-                        std::memcpy(oTile.data() + nRow * nWidth * nPixelBytes,
-                                    oPixels.data() + (nY + nRow) * nPitch + nX * nPixelBytes, nWidth * nPixelBytes);
-                    oIO.WriteWindow(nX, nY, nWidth, nHeight, oTile.data());
-                });
+    for (unsigned int nY = 0; nY < oIO.GetFileHeight(); nY += oIO.GetTileHeight())
+        for (unsigned int nX = 0; nX < oIO.GetFileWidth(); nX += oIO.GetTileWidth())
+        {
+            const unsigned int nWidth = std::min(oIO.GetTileWidth(), oIO.GetFileWidth() - nX);
+            const unsigned int nHeight = std::min(oIO.GetTileHeight(), oIO.GetFileHeight() - nY);
+            Bytes oTile(nWidth * nHeight * nPixelBytes);
+            for (unsigned int nRow = 0; nRow < nHeight; ++nRow)
+                std::memcpy(oTile.data() + nRow * nWidth * nPixelBytes,
+                            oPixels.data() + (nY + nRow) * nPitch + nX * nPixelBytes, nWidth * nPixelBytes);
+            oIO.WriteWindow(nX, nY, nWidth, nHeight, oTile.data());
+        }
 }
 
 std::size_t PixelBytes(const krv::plugins::tif::TifDataset& oDataset)

@@ -5,6 +5,7 @@
 #include "gobs/raster/rasterinfo.h"
 #include "plugins/tif/reading/rawdirectory.h"
 #include "tests/plugins/tif/tifsupport.h"
+#include "tests/support/thrown.h"
 #include "tests/support/tiffwriter.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
@@ -134,22 +135,11 @@ TEST(TifPaths, PagesBelowTheFirstAndTagsThatNobodyAskedAboutStay)
     WriteAll(*IOPointer(poLevels->GetOverviewIO(2, {1})), 1, oLevel);
     poLevels->SetValid(1, 2, true);
     AuxiliaryData oRecord = poDataset->ReadAuxiliaryData();
-    const std::string polynomials = [&aValues]
-    {
-        std::ostringstream oText;
-        for (int n = 0; n < 92; ++n)
-            oText << (n == 0 ? "" : " ") << aValues[n];
-        return oText.str();
-    }();
-    oRecord.SetFileMetadataValue("RPC", polynomials);
-    oRecord.SetFileMetadataValue("GroundControlPoints", "1 2 10 20 0; 30 2 40 20 0; 1 30 10 60 0");
     poDataset->WriteAuxiliaryData(oRecord);
     poDataset->Close();
     // Another update, of something else.
     poDataset = OpenTif(fileName, eUpdate);
     oRecord = poDataset->ReadAuxiliaryData();
-    EXPECT_EQ(oRecord.GetFileMetadataValue("RPC"), polynomials);
-    EXPECT_EQ(oRecord.GetFileMetadataValue("GroundControlPoints"), "1 2 10 20 0; 30 2 40 20 0; 1 30 10 60 0");
     oRecord.SetFileMetadataValue("Note", "changed");
     poDataset->WriteAuxiliaryData(oRecord);
     poDataset->Close();
@@ -288,10 +278,10 @@ TEST(TifPaths, ACloudOptimisedFileIsInItsOrder)
     for (const char* pOptions : {"", " BIGTIFF=YES COMPRESS=ZSTD"})
     {
         const std::string fileName = oFolder.File("cog.tif");
-        const auto Create = [&](const std::string& options, const std::string& name)
         {
-            TifPointer poDataset =
-                CreateTif(name, "BLOCKXSIZE=32 BLOCKYSIZE=32" + options, 300, 200, 3, krv::gobs::eDT_8U);
+            const TifPointer poDataset =
+                CreateTif(fileName, std::string("LAYOUT=COG BLOCKXSIZE=32 BLOCKYSIZE=32") + pOptions, 300, 200, 3,
+                          krv::gobs::eDT_8U);
             const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poDataset->GetOverviewManager());
             for (const unsigned int nLevel : {4U, 2U})
             {
@@ -305,8 +295,7 @@ TEST(TifPaths, ACloudOptimisedFileIsInItsOrder)
             oRecord.SetFileMetadataValue("Note", std::string(9000, 'x'));
             poDataset->WriteAuxiliaryData(oRecord);
             poDataset->Close();
-        };
-        Create(pOptions + std::string(" LAYOUT=COG"), fileName);
+        }
         EXPECT_EQ(ListFolder(oFolder.GetPath()), std::vector<std::string>{"cog.tif"});
         TIFF* const poTiff = TIFFOpen(fileName.c_str(), "r");
         std::uint64_t nLastDirectory = 0, nFirstBlock = UINT64_MAX, nEarliestBefore = UINT64_MAX;
@@ -339,15 +328,7 @@ TEST(TifPaths, ACloudOptimisedFileIsInItsOrder)
         EXPECT_GT(nFirstBlock, nLastDirectory);
         EXPECT_GT(nFirstBlock, ReadFile(fileName).rfind("xxxx")) << "a value stands behind a block";
 
-        const std::string plain = oFolder.File("plain.tif");
-        Create(pOptions, plain);
-        const TifPointer poCloud = OpenTif(fileName), poPlain = OpenTif(plain);
-        EXPECT_TRUE(ReadAll(*poCloud) == ReadAll(*poPlain));
-        EXPECT_EQ(poCloud->ReadAuxiliaryData().GetFileMetadata(), poPlain->ReadAuxiliaryData().GetFileMetadata());
-        EXPECT_EQ(poCloud->GetBitmapList(), poPlain->GetBitmapList());
         EXPECT_EQ(Judge(fileName, 2).moComplaints, "");
-        EXPECT_TRUE(Judge(fileName, 2).moPixels == Judge(plain, 2).moPixels);
-        std::filesystem::remove(plain);
     }
 }
 
@@ -367,15 +348,7 @@ TEST(TifPaths, AClassicFileThatIsFullAndAFileThatIsOnlyReadSaySo)
 
     std::filesystem::resize_file(fileName, UINT32_MAX - 70000); // a hole takes no room
     TifPointer poDataset = OpenTif(fileName, eUpdate);
-    try
-    {
-        WriteAll(*poDataset, oPixels);
-        FAIL() << "what lies behind 4 GiB was written";
-    }
-    catch (const krv::IOException& oException)
-    {
-        EXPECT_THAT(oException.GetMessage(), testing::HasSubstr("full.tif"));
-    }
+    EXPECT_THAT(Error([&] { WriteAll(*poDataset, oPixels); }), testing::ContainsRegex("^io: .*full.tif"));
     poDataset.reset();
     std::filesystem::resize_file(fileName, before.size());
     EXPECT_EQ(ReadFile(fileName), before);
@@ -466,15 +439,8 @@ TEST(TifPaths, TheStructureOfAFileIsBoundedByItsSize)
                 static_cast<unsigned char>((nAt + 200 < 400000 ? nAt + 200 : 0) >> 8 * nByte);
     }
     WriteBytes(fileName, oBytes);
-    try
-    {
-        OpenTif(fileName, eUpdate);
-        FAIL() << "lists of 6 GB are kept";
-    }
-    catch (const krv::FileFormatException& oException)
-    {
-        EXPECT_THAT(oException.GetMessage(), testing::HasSubstr("claim far more than the file holds"));
-    }
+    EXPECT_THAT(Error([&] { OpenTif(fileName, eUpdate); }),
+                testing::ContainsRegex("^file: .*claim far more than the file holds"));
 
     constexpr std::uint32_t BELOW = 1200;
     Handmade oFirst = Handmade::Image(4, 4, 4, 1, 1, 900, 16);
