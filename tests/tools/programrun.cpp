@@ -12,6 +12,7 @@
 #include <algorithm>
 #include <chrono>
 #include <csignal>
+#include <fstream>
 #include <stdexcept>
 #include <thread>
 
@@ -32,6 +33,16 @@ std::vector<char*> Pointers(std::vector<std::string>& oTexts)
         oPointers.push_back(text.data());
     oPointers.push_back(nullptr);
     return oPointers;
+}
+
+// Whether the signals that a process has a handler for, a hexadecimal mask, have SIGINT among them.
+bool CatchesInterrupts(pid_t nProcess)
+{
+    std::ifstream oStatus("/proc/" + std::to_string(nProcess) + "/status");
+    for (std::string word; oStatus >> word;)
+        if (word == "SigCgt:" && oStatus >> word)
+            return (std::stoull(word, nullptr, 16) >> (SIGINT - 1) & 1) != 0;
+    return false;
 }
 
 } // namespace
@@ -59,6 +70,9 @@ ProgramRun RunProgram(const std::string& program, const std::vector<std::string>
         throw std::runtime_error(program + " could not be started");
     if (nInterruptAfterMs != 0)
     {
+        // Before it listens the signal would just kill it, however busy the machine is.
+        for (int nWait = 0; nWait < 6000 && !CatchesInterrupts(nProcess); ++nWait)
+            std::this_thread::sleep_for(std::chrono::milliseconds(10));
         std::this_thread::sleep_for(std::chrono::milliseconds(nInterruptAfterMs));
         kill(nProcess, SIGINT);
     }
