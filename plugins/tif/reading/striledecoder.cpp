@@ -76,6 +76,13 @@ void StrileDecoder::DecodeByLibrary(std::uint32_t nStrile, unsigned char* pRaw, 
     std::span<unsigned char> oRaw{pRaw, nRaw};
     if (moForm.mnCompression == COMPRESSION_JPEG)
         PrepareJpeg(nStrile, oRaw);
+    std::vector<unsigned char> oCopy;
+    if (moForm.mnCompression == COMPRESSION_JBIG)
+    {
+        // libtiff turns the bits of these where they lie, and the caller keeps the bytes for the next reading.
+        oCopy.assign(oRaw.begin(), oRaw.end());
+        oRaw = oCopy;
+    }
     TiffHandle& oHandle = moPage.GetHandle();
     oHandle.Forget();
     const int nDone = TIFFReadFromUserBuffer(oHandle.Get(), nStrile, oRaw.data(), static_cast<tmsize_t>(oRaw.size()),
