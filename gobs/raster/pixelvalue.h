@@ -42,15 +42,18 @@ constexpr NativeDataTypeCode FindPixelType(std::type_identity<std::tuple<Values.
     return static_cast<NativeDataTypeCode>(nCode);
 }
 
-template <class Visitor, class... Values>
-decltype(auto) VisitValue(NativeDataTypeCode eType, const Visitor& oVisitor, std::type_identity<std::tuple<Values...>>)
+// One comparison after the other: a table of calls would need the type of their results beforehand, and asking for it
+// makes clang 16 lose virtual members of templates that the visitor names.
+template <class Visitor, class First, class... Rest>
+decltype(auto) VisitValue(NativeDataTypeCode eType, const Visitor& oVisitor,
+                          std::type_identity<std::tuple<First, Rest...>>)
 {
-    using Result = std::invoke_result_t<const Visitor&, std::type_identity<std::uint8_t>>;
-    constexpr Result (*CALLS[])(const Visitor&) = {[](const Visitor& oCalled) -> Result
-                                                   {
-                                                       return oCalled(std::type_identity<Values>());
-                                                   }...};
-    return CALLS[eType](oVisitor);
+    if constexpr (sizeof...(Rest) > 0)
+    {
+        if (eType != FindPixelType<First>(std::type_identity<PixelValues>()))
+            return VisitValue(eType, oVisitor, std::type_identity<std::tuple<Rest...>>());
+    }
+    return oVisitor(std::type_identity<First>());
 }
 
 // The type's code. Throws DataException for one-bit values and for a type outside the table.

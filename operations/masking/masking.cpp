@@ -25,6 +25,7 @@
 
 #include <algorithm>
 #include <bit>
+#include <cmath>
 #include <functional>
 #include <limits>
 #include <memory>
@@ -162,8 +163,8 @@ public:
         : mnFullWidth(nWidth), mnFullHeight(nHeight)
     {
         const double nScale = std::min(static_cast<double>(nLongest) / std::max({nWidth, nHeight, 1u}), 1.0);
-        moPicture.width = std::max(static_cast<unsigned int>(nWidth * nScale + 0.5), 1u);
-        moPicture.height = std::max(static_cast<unsigned int>(nHeight * nScale + 0.5), 1u);
+        moPicture.width = std::max(static_cast<unsigned int>(std::lround(nWidth * nScale)), 1u);
+        moPicture.height = std::max(static_cast<unsigned int>(std::lround(nHeight * nScale)), 1u);
         moPicture.samples = 1;
         moCounts.resize(std::size_t{moPicture.width} * moPicture.height);
     }

@@ -55,7 +55,7 @@ class MetadataWriter
 {
 public:
     // The editor outlives it.
-    MetadataWriter(FileEditor& oEditor, std::shared_ptr<PageModel> poPage)
+    MetadataWriter(FileEditor& oEditor, const std::shared_ptr<PageModel>& poPage)
         : moEditor(oEditor), mpoPage(poPage), moGeography(oEditor, poPage)
     {
     }
@@ -439,10 +439,10 @@ private:
 
 } // namespace
 
-void WriteMetadata(FileEditor& oEditor, std::shared_ptr<PageModel> poPage, const AuxiliaryData& oNew,
+void WriteMetadata(FileEditor& oEditor, const std::shared_ptr<PageModel>& poPage, const AuxiliaryData& oNew,
                    const Place& oPlace)
 {
-    MetadataWriter(oEditor, std::move(poPage)).Write(oNew, oPlace);
+    MetadataWriter(oEditor, poPage).Write(oNew, oPlace);
 }
 
 } // namespace krv::plugins::tif

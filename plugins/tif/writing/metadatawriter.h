@@ -14,7 +14,7 @@ namespace krv::plugins::tif
 // tag and by an item. An empty value counts as none. What the form of the pixels says by itself (colours) cannot be
 // taken away, only said otherwise. Throws DataException for a record of another channel count and for one that is too
 // long to be read again.
-void WriteMetadata(FileEditor& oEditor, std::shared_ptr<PageModel> poPage, const krv::datasources::AuxiliaryData& oNew,
-                   const Place& oPlace);
+void WriteMetadata(FileEditor& oEditor, const std::shared_ptr<PageModel>& poPage,
+                   const krv::datasources::AuxiliaryData& oNew, const Place& oPlace);
 
 } // namespace krv::plugins::tif
