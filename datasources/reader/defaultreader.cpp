@@ -19,6 +19,7 @@ IRasterReader* CreateDefaultReader(IDataset* poDataset, const std::vector<unsign
     }
 }
 
+// NOLINTNEXTLINE(performance-unnecessary-value-param)
 IRasterReader* CreateDefaultReader(std::string fileName, const std::vector<unsigned int>& oChannels)
 {
     try

@@ -330,7 +330,7 @@ void ReadWhatThereIs(const Plugin& oPlugin, const std::string& file)
     {
         const DatasetPtr oDataset = Open(oPlugin, file);
         oDataset->ReadAuxiliaryData();
-        std::unique_ptr<krv::ogc::cs::ICRS>(oDataset->ReadCRS());
+        const std::unique_ptr<krv::ogc::cs::ICRS> oSystem(oDataset->ReadCRS());
         IRasterDataset& oRaster = Raster(*oDataset);
         for (unsigned int nChannel = 1; nChannel <= std::min(oRaster.GetChanCount(), 16u); ++nChannel)
         {
