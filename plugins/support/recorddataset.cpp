@@ -70,11 +70,15 @@ krv::datasources::IOverviewManager* RecordDataset::GetOverviewManager()
 
 void RecordDataset::ForgetLevels()
 {
+    if (moRecord.moLevels.empty())
+        return;
+    // On a copy: where the header has no room for it the pixels are refused, and so they are the next time.
+    RecordText oRecord = moRecord;
     bool bNews = false;
     for (const auto& [nLevel, nPlace] : moRecord.moLevels)
-        bNews = krv::datasources::SetLevelInvalid(moRecord.moTags, nLevel) || bNews;
+        bNews = krv::datasources::SetLevelInvalid(oRecord.moTags, nLevel) || bNews;
     if (bNews)
-        StoreRecord(moRecord);
+        Change(std::move(oRecord));
 }
 
 std::vector<LevelStore::Level> RecordDataset::GetLevels() const
@@ -101,12 +105,13 @@ void RecordDataset::MakeLevel(const Level& oLevel, const krv::datasources::Auxil
     Change(std::move(oRecord));
 }
 
-void RecordDataset::DropLevel(unsigned int nLevel, const krv::datasources::AuxiliaryData& oBook, const Place& oPlace)
+void RecordDataset::DropLevel(unsigned int nLevel, const krv::datasources::AuxiliaryData& oBook, const Place&)
 {
-    WriteBook(oBook, false, oPlace);
-    moRecord.moLevels.erase(nLevel);
+    RecordText oRecord = moRecord;
+    oRecord.moTags = oBook;
+    oRecord.moLevels.erase(nLevel);
+    Change(std::move(oRecord));
     moOpened.erase(nLevel);
-    StoreRecord(moRecord);
 }
 
 void RecordDataset::WriteBook(const krv::datasources::AuxiliaryData& oBook, bool, const Place&)

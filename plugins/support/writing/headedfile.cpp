@@ -73,6 +73,7 @@ void HeadedFile::BeginChange()
     CheckWritable();
     if (mbMarked)
         return;
+    mbChanged = true; // a mark that did not reach the disk for certain is still one to take away
     GetFile()->Write(0, moFirstLines.moUnfinished.data(), moFirstLines.moUnfinished.size());
     GetFile()->Flush();
     mbMarked = true;
@@ -89,13 +90,14 @@ std::uint64_t HeadedFile::Append(std::uint64_t nBytes)
 // A header can tear when the machine stops, so the mark stands until the rest of it is on the disk.
 void HeadedFile::Store()
 {
-    if (!mbMarked)
+    if (!mbChanged)
         return;
     GetFile()->Write(moFirstLines.moFinished.size(), moHeader.data(), moHeader.size());
     GetFile()->Flush();
     GetFile()->Write(0, moFirstLines.moFinished.data(), moFirstLines.moFinished.size());
     GetFile()->Flush();
     mbMarked = false;
+    mbChanged = false;
 }
 
 } // namespace krv::plugins::support

@@ -46,13 +46,14 @@ public:
 
 protected:
     void Store() override;
-    bool HoldsChanges() const override { return mbMarked; }
+    bool HoldsChanges() const override { return mbChanged; }
 
 private:
     FirstLines moFirstLines;
     std::string moHeader;
     std::uint64_t mnHeaderBytes;
-    bool mbMarked = false;
+    bool mbMarked = false;  // for certain, on the disk
+    bool mbChanged = false; // or about to be
 };
 
 } // namespace krv::plugins::support
