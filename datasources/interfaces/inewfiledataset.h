@@ -5,7 +5,8 @@
 namespace krv::datasources
 {
 
-// A dataset whose file may still have to get its name. The order of the virtual operations is public and fixed.
+// A dataset whose file may still have to get its name: until then IDataset::Delete removes what was made and leaves
+// another file of the name alone. The order of the virtual operations is public and fixed.
 class KRV_DATASOURCES_API INewFileDataset
 {
 public:

@@ -90,7 +90,10 @@ bool Target::IsLossy() const
 
 void Target::Make(const CopyPlan& oPlan, const std::string& options)
 {
-    mpoDataset.reset(); // the one before goes first: both have the same name
+    // The one before goes first: both have the same name. It was a trial, of which nothing is lost.
+    if (Find<INewFileDataset>() != nullptr)
+        mpoDataset->Delete();
+    mpoDataset.reset();
     mpoDataset.reset(DatasetManager::GetInstance()->NewDataset(moName, moFormat, options));
     // A file that another program makes meanwhile is not replaced.
     if (auto* const poNew = Find<INewFileDataset>(); poNew != nullptr && mbNew)
