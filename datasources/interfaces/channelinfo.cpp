@@ -16,8 +16,8 @@ krv::gobs::DataTypeConstraints MakeConstraints(const krv::gobs::DataType& oType)
 
 } // namespace
 
-ChannelInfo::ChannelInfo(const krv::gobs::DataType& oType)
-    : moNativeType(oType), moType(oType), moConstraints(MakeConstraints(oType))
+ChannelInfo::ChannelInfo(const krv::gobs::DataType& oNativeType, const krv::gobs::DataType& oType)
+    : moNativeType(oNativeType), moType(oType), moConstraints(MakeConstraints(oType))
 {
 }
 

@@ -6,11 +6,14 @@
 namespace krv::datasources
 {
 
-// The plain description of a channel that is stored as it is handed out.
+// The plain description of a channel.
 class KRV_DATASOURCES_API ChannelInfo : public IChannelInfo
 {
 public:
-    explicit ChannelInfo(const krv::gobs::DataType& oType);
+    // A channel that is stored as it is handed out.
+    explicit ChannelInfo(const krv::gobs::DataType& oType) : ChannelInfo(oType, oType) {}
+    // A channel that the file stores in a type of its own and hands out as oType.
+    ChannelInfo(const krv::gobs::DataType& oNativeType, const krv::gobs::DataType& oType);
     ~ChannelInfo() override;
 
     const krv::gobs::DataType& GetNativeDataType() const override { return moNativeType; }

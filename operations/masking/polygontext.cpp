@@ -1,6 +1,7 @@
 #include "operations/masking/polygontext.h"
 
 #include "operations/job/exceptions.h"
+#include "toolkit/core/lettercase.h"
 
 #include <fmt/format.h>
 
@@ -82,8 +83,8 @@ private:
         SkipBlanks();
         std::string word;
         for (; mnAt < moText.size() && std::isalpha(static_cast<unsigned char>(moText[mnAt])) != 0; ++mnAt)
-            word += static_cast<char>(std::toupper(static_cast<unsigned char>(moText[mnAt])));
-        return word;
+            word += moText[mnAt];
+        return krv::ToUpper(word);
     }
 
     double Number()

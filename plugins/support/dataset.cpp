@@ -1,9 +1,9 @@
 #include "plugins/support/dataset.h"
 
+#include "datasources/interfaces/channelinfo.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/raster/rasterinfo.h"
 #include "plugins/support/image/rasterio.h"
-#include "plugins/support/image/storedchannelinfo.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 
@@ -224,7 +224,8 @@ unsigned int Dataset::GetChanCount() const
 
 krv::datasources::IChannelInfo* Dataset::GetChannelInfo(unsigned int nChannel) const
 {
-    return new StoredChannelInfo(GetLayout().GetChannelPlane(nChannel));
+    const Plane& oPlane = GetLayout().GetChannelPlane(nChannel);
+    return new krv::datasources::ChannelInfo(oPlane.moNativeType, oPlane.moType);
 }
 
 krv::datasources::IHistoryIO* Dataset::GetHistoryIO(unsigned int)

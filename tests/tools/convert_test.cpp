@@ -266,6 +266,7 @@ TEST(Convert, KeepsHowTheFileIsStoredWhereNoOptionSaysOtherwise)
     EXPECT_EQ(oLeft.code, 0);
     for (const char* pWord : {"compression LZW", "interleaving by band", "tiles of 64 x 32"})
         EXPECT_NE(oLeft.errors.find(pWord), std::string::npos) << oLeft.errors;
+    EXPECT_EQ(oLeft.errors.find("goes without"), std::string::npos) << oLeft.errors;
 }
 
 // A part of an image in JPEG is stored without further loss, and its no-data value holds; encoding with loss makes a
