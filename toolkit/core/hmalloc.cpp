@@ -1,5 +1,6 @@
 #include "toolkit/core/hmalloc.h"
 
+#include "toolkit/cache/detail/ledger.h"
 #include "toolkit/core/detail/blockpool.h"
 
 #include <cstdlib>
@@ -43,7 +44,9 @@ void* HMalloc(std::size_t nBytes)
 
 void HFree(void* pBlock) noexcept
 {
-    goPool.Free(pBlock);
+    krv::cache::detail::Ledger& oLedger = krv::cache::detail::Ledger::Process();
+    if (const std::size_t nRefused = goPool.Free(pBlock, oLedger.GetMostKept()); nRefused != 0)
+        oLedger.NoteRefused(nRefused);
 }
 
 void HTrim() noexcept

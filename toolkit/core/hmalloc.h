@@ -6,8 +6,8 @@
 
 // Memory for raster buffers: 64-byte aligned, contents undefined. Large blocks that are freed are kept for reuse, so
 // that a loop of new raster, use, delete does not pay for fresh pages each time; what is kept is bounded by the peak of
-// live bytes and by 512 MiB. Any thread may free what another allocated; threads do not wait for each other here. Under
-// a sanitizer nothing is kept.
+// live bytes and by 512 MiB, and counts into the budget of krv::cache::TileStore. Any thread may free what another
+// allocated; threads do not wait for each other here. Under a sanitizer nothing is kept.
 
 // Throws std::bad_alloc. A size of 0 gives a block that may be freed.
 KRV_TOOLKIT_API void* HMalloc(std::size_t nBytes);

@@ -76,15 +76,19 @@ void* BlockPool::Allocate(std::size_t nBytes)
     return poBlock->Memory();
 }
 
-void BlockPool::Free(void* pBlock) noexcept
+std::size_t BlockPool::Free(void* pBlock, std::size_t nMost) noexcept
 {
     if (pBlock == nullptr)
-        return;
+        return 0;
     Block* poBlock = Block::Of(pBlock);
     if (poBlock->mnRequested >= SMALLEST_KEPT)
         mnLive.fetch_sub(poBlock->mnRequested, std::memory_order_relaxed);
-    if (!Keep(poBlock))
-        Block::Delete(poBlock);
+    if (Keep(poBlock, nMost))
+        return 0;
+    const std::size_t nPeak = std::min(MOST_KEPT, mnPeak.load(std::memory_order_relaxed));
+    const std::size_t nBytes = poBlock->mnClass == NO_CLASS ? 0 : poBlock->mnTouched;
+    Block::Delete(poBlock);
+    return nMost < nPeak && nBytes <= nPeak ? nBytes : 0;
 }
 
 void BlockPool::Trim() noexcept
@@ -169,12 +173,12 @@ bool BlockPool::Put(SizeClass& oClass, Block* poBlock) noexcept
     return false;
 }
 
-bool BlockPool::Keep(Block* poBlock) noexcept
+bool BlockPool::Keep(Block* poBlock, std::size_t nMost) noexcept
 {
     if (poBlock->mnClass == NO_CLASS)
         return false;
     const std::size_t nBytes = poBlock->mnTouched;
-    if (!Reserve(nBytes) && !MakeRoom(nBytes))
+    if (!Reserve(nBytes, nMost) && !MakeRoom(nBytes, nMost))
         return false;
     if (Put(moClasses[poBlock->mnClass], poBlock))
         return true;
@@ -182,9 +186,9 @@ bool BlockPool::Keep(Block* poBlock) noexcept
     return false;
 }
 
-bool BlockPool::Reserve(std::size_t nBytes) noexcept
+bool BlockPool::Reserve(std::size_t nBytes, std::size_t nMost) noexcept
 {
-    const std::size_t nMost = std::min(MOST_KEPT, mnPeak.load(std::memory_order_relaxed));
+    nMost = std::min({nMost, MOST_KEPT, mnPeak.load(std::memory_order_relaxed)});
     std::size_t nKept = mnKept.load(std::memory_order_relaxed);
     do
     {
@@ -195,7 +199,7 @@ bool BlockPool::Reserve(std::size_t nBytes) noexcept
 }
 
 // Classes that nobody wanted since the last search give up their blocks; the others are spared once.
-bool BlockPool::MakeRoom(std::size_t nBytes) noexcept
+bool BlockPool::MakeRoom(std::size_t nBytes, std::size_t nMost) noexcept
 {
     for (std::size_t i = 0; i < CLASSES; ++i)
     {
@@ -206,7 +210,7 @@ bool BlockPool::MakeRoom(std::size_t nBytes) noexcept
         while (Block* poBlock = Take(oClass))
         {
             Block::Delete(poBlock);
-            if (Reserve(nBytes))
+            if (Reserve(nBytes, nMost))
                 return true;
         }
     }

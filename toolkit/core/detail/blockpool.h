@@ -27,8 +27,9 @@ public:
 
     // Throws std::bad_alloc.
     void* Allocate(std::size_t nBytes);
-    // A block of this pool, or null.
-    void Free(void* pBlock) noexcept;
+    // A block of this pool, or null. Keeps it unless more than nMost bytes were kept then; returns the bytes that it
+    // would have kept were it not for nMost.
+    std::size_t Free(void* pBlock, std::size_t nMost = MOST_KEPT) noexcept;
 
     // Gives back all that is kept; the peak starts anew from what is live.
     void Trim() noexcept;
@@ -59,9 +60,9 @@ private:
     bool Put(SizeClass& oClass, Block* poBlock) noexcept;
     Block* TakeFor(std::size_t nBytes) noexcept;
     Block* MakeFor(std::size_t nBytes);
-    bool Reserve(std::size_t nBytes) noexcept;
-    bool MakeRoom(std::size_t nBytes) noexcept;
-    bool Keep(Block* poBlock) noexcept;
+    bool Reserve(std::size_t nBytes, std::size_t nMost) noexcept;
+    bool MakeRoom(std::size_t nBytes, std::size_t nMost) noexcept;
+    bool Keep(Block* poBlock, std::size_t nMost) noexcept;
     void NoteLive(std::size_t nBytes) noexcept;
 
     std::array<SizeClass, CLASSES> moClasses{};

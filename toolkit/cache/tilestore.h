@@ -1,0 +1,261 @@
+#pragma once
+
+#include "toolkit/api.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <exception>
+#include <memory>
+#include <string>
+
+namespace krv::cache
+{
+
+namespace detail
+{
+struct Entry;
+struct OwnerState;
+class Store;
+} // namespace detail
+
+// A tile is any bytes in rows without gaps.
+struct TileShape
+{
+    std::size_t mnRowBytes = 0;
+    std::size_t mnRows = 1;
+
+    friend bool operator==(const TileShape&, const TileShape&) = default;
+};
+
+// A part of a tile: bytes along each row, and rows.
+struct TileArea
+{
+    std::size_t mnX = 0;
+    std::size_t mnY = 0;
+    std::size_t mnRowBytes = 0;
+    std::size_t mnRows = 0;
+};
+
+// The border of a tile: bytes at both ends of every row, rows above and below.
+struct TileFrame
+{
+    std::size_t mnLeft = 0;
+    std::size_t mnTop = 0;
+    std::size_t mnRight = 0;
+    std::size_t mnBottom = 0;
+
+    friend bool operator==(const TileFrame&, const TileFrame&) = default;
+};
+
+// One of an owner's tiles.
+struct TileName
+{
+    std::uint64_t mnTile = 0;
+    std::uint32_t mnLayer = 0;
+
+    friend bool operator==(const TileName&, const TileName&) = default;
+};
+
+// What is asked of the store. Whoever uses the same name gives the same shape.
+struct TileRequest
+{
+    TileName moName;
+    TileShape moShape;
+    TileArea moArea;   // inside the shape
+    TileFrame moFrame; // what of the tile stays when all of it has to make room; more than half of it: nothing stays
+};
+
+// Numbers of the store since it began, or since ResetStatistics.
+struct TileStatistics
+{
+    std::uint64_t mnHits = 0;      // looks that found the tile, or the part of it that was asked for
+    std::uint64_t mnMisses = 0;    // tiles that had to be made
+    std::uint64_t mnWaits = 0;     // looks that waited for another thread to make the tile
+    std::uint64_t mnEvictions = 0; // tiles that made room, all or all but their frame
+    std::uint64_t mnTiles = 0;     // tiles and frames there are now
+    std::uint64_t mnBytes = 0;     // what counts into the budget now, without freed raster buffers
+    std::uint64_t mnPeak = 0;      // the most of these bytes there were
+};
+
+class TileClaim;
+class TileOwner;
+
+// Decoded tiles of the whole process, the least recently used go first. One budget in bytes holds for all of them, for
+// what TileCharge names, and for the raster buffers that HMalloc keeps; it is set by SetBudget and by nothing else.
+// Tiles that somebody holds stay, so that the bytes can exceed a budget that is less than what is in use.
+// Any number of threads may use it. None waits for another unless both want a tile that one of them is making.
+class KRV_TOOLKIT_API TileStore
+{
+public:
+    // The process's own.
+    static TileStore& Process();
+    // The smaller of 1 GiB and a quarter of the memory.
+    static std::uint64_t GetDefaultBudget();
+
+    // Another one, with a budget of its own.
+    explicit TileStore(std::uint64_t nBudget);
+    ~TileStore();
+    TileStore(const TileStore&) = delete;
+    TileStore& operator=(const TileStore&) = delete;
+
+    // In bytes. What is above it now goes, as far as nobody holds it.
+    void SetBudget(std::uint64_t nBytes);
+    std::uint64_t GetBudget() const;
+
+    TileStatistics GetStatistics() const;
+    // Counts anew; the peak begins at what there is.
+    void ResetStatistics();
+    // Drops all tiles that nobody holds.
+    void Clear();
+
+private:
+    friend class TileOwner;
+    friend class TileCharge;
+
+    explicit TileStore(std::unique_ptr<detail::Store> poStore);
+
+    std::unique_ptr<detail::Store> mpoStore;
+};
+
+// Keeps a tile where it is, and points to the part that was asked for: to be let go soon. Empty when there is none.
+class KRV_TOOLKIT_API TileHold
+{
+public:
+    TileHold() = default;
+    TileHold(TileHold&& oOther) noexcept;
+    TileHold& operator=(TileHold&& oOther) noexcept;
+    ~TileHold();
+
+    explicit operator bool() const { return mpFirst != nullptr; }
+    // The first byte of the part, and the bytes from each of its rows to the next.
+    const unsigned char* GetFirst() const { return mpFirst; }
+    std::size_t GetPitch() const { return mnPitch; }
+
+private:
+    friend class TileClaim;
+    friend class TileOwner;
+
+    // Takes over one reference.
+    TileHold(detail::Store& oStore, detail::Entry* poEntry, const TileArea& oArea);
+
+    detail::Store* mpoStore = nullptr;
+    detail::Entry* mpoEntry = nullptr;
+    const unsigned char* mpFirst = nullptr;
+    std::size_t mnPitch = 0;
+};
+
+// The task to make a tile; others that want it wait. It is done on the thread that got it, which may look for other
+// tiles meanwhile and never waits for one then: what another thread is making it gets a claim of its own for. So no two
+// threads ever wait for each other. One that goes undone has those who wait look again.
+class KRV_TOOLKIT_API TileClaim
+{
+public:
+    TileClaim() = default;
+    TileClaim(TileClaim&& oOther) noexcept;
+    TileClaim& operator=(TileClaim&& oOther) noexcept;
+    ~TileClaim();
+
+    explicit operator bool() const { return mpoEntry != nullptr; }
+    // The memory of the tile, 64-byte aligned, contents undefined.
+    unsigned char* GetBytes() const;
+
+    // The tile is made. oArea: what the caller wants of it.
+    TileHold Publish(const TileArea& oArea);
+    // The tile is made, but for the caller alone; who waits looks again.
+    TileHold Withhold(const TileArea& oArea);
+    // It cannot be made: who waits gets the exception, and nothing stays.
+    void Fail(std::exception_ptr oFailure) noexcept;
+
+private:
+    friend class TileOwner;
+
+    TileClaim(detail::Store& oStore, detail::Entry* poEntry);
+    void End(int nState, const std::exception_ptr& oFailure) noexcept;
+
+    detail::Store* mpoStore = nullptr;
+    detail::Entry* mpoEntry = nullptr;
+};
+
+// What a look gave: a hold, or a claim, or neither when the tile is being made and the caller did not want to wait.
+struct TileLook
+{
+    TileHold moHold;
+    TileClaim moClaim;
+};
+
+// Somebody's tiles in a store. Owners with the same identity have the same tiles: what one of them made the others
+// find. When the last of them goes its tiles go too; so do holds and claims before.
+class KRV_TOOLKIT_API TileOwner
+{
+public:
+    // Shares with nobody.
+    explicit TileOwner(TileStore& oStore = TileStore::Process());
+    // identity: any bytes that say all of what decides which bytes a tile has.
+    explicit TileOwner(const std::string& identity, TileStore& oStore = TileStore::Process());
+    ~TileOwner();
+    TileOwner(const TileOwner&) = delete;
+    TileOwner& operator=(const TileOwner&) = delete;
+
+    enum class Wait
+    {
+        eYes,
+        eNo
+    };
+
+    // The part of the tile when it is there, of one that is being made after it is; otherwise empty. Throws what the
+    // maker threw.
+    TileHold Find(const TileRequest& oRequest, Wait eWait = Wait::eYes) const;
+    // The same, with the claim to make a tile that is not there. Throws std::bad_alloc too.
+    TileLook Look(const TileRequest& oRequest, Wait eWait = Wait::eYes) const;
+
+    // The part of a tile that is made when it is not there. oMake(unsigned char* pBytes) fills all of its rows; what it
+    // throws passes, here and in all threads that wait for the tile.
+    template <typename Make>
+    TileHold Obtain(const TileRequest& oRequest, const Make& oMake) const
+    {
+        TileLook oLook = Look(oRequest);
+        if (!oLook.moClaim)
+            return std::move(oLook.moHold);
+        try
+        {
+            oMake(oLook.moClaim.GetBytes());
+        }
+        catch (...)
+        {
+            oLook.moClaim.Fail(std::current_exception());
+            throw;
+        }
+        return oLook.moClaim.Publish(oRequest.moArea);
+    }
+
+    // The tile is not expected to be wanted again, or no more of it than the frame: of all tiles it goes first.
+    void Retire(const TileName& oName, const TileFrame& oFrame = {}) const;
+    // Forgets a tile, or all of them, those that are being made included.
+    void Drop(const TileName& oName) const;
+    void DropAll() const;
+    // Whether there is no tile, not even one that is being made.
+    bool IsEmpty() const;
+
+private:
+    detail::Store& moStore;
+    std::shared_ptr<detail::OwnerState> mpoState;
+};
+
+// Bytes that somebody keeps elsewhere and that count into the budget of the store.
+class KRV_TOOLKIT_API TileCharge
+{
+public:
+    explicit TileCharge(TileStore& oStore = TileStore::Process());
+    ~TileCharge();
+    TileCharge(const TileCharge&) = delete;
+    TileCharge& operator=(const TileCharge&) = delete;
+
+    // From now on so many; tiles make room for what is more than before.
+    void Set(std::size_t nBytes);
+
+private:
+    detail::Store& moStore;
+    std::size_t mnBytes = 0;
+};
+
+} // namespace krv::cache
