@@ -2,6 +2,7 @@
 
 #include "datasources/api.h"
 
+#include <string>
 #include <vector>
 
 namespace krv::mathmodel
@@ -25,6 +26,27 @@ public:
     // A new model from an ephemeris segment and a further segment (0: none), owned by the caller. Throws krv::Exception
     // when they make none.
     virtual krv::mathmodel::IMathModel* BuildMathModel(unsigned int nEphemeris, unsigned int nSegment) = 0;
+    // Stores records as they are and returns their segment. kind: what wrote them and how they are laid out, in words
+    // that whoever reads them knows. Throws DataException where the format has no place for them.
+    virtual unsigned int CreateEphemeris(const std::string& kind, const std::vector<unsigned char>& oRecords) = 0;
+};
+
+// Records of a segment as they were stored.
+struct EphemerisRecords
+{
+    std::string kind;
+    std::vector<unsigned char> bytes;
+};
+
+// A dataset that hands its orbits out as records, whether or not it makes models of them. The order of the virtual
+// operations is public and fixed.
+class KRV_DATASOURCES_API IEphemerisRecords
+{
+public:
+    virtual ~IEphemerisRecords();
+
+    // Throws DataException for a segment that is none of ephemeris.
+    virtual EphemerisRecords ReadEphemeris(unsigned int nSegment) const = 0;
 };
 
 } // namespace krv::datasources

@@ -10,6 +10,7 @@
 #include "datasources/interfaces/ifileiobuilder.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
+#include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/interfaces/ioverviewio.h"
@@ -29,10 +30,12 @@ IChannelInfo::~IChannelInfo() = default;
 IDataset::~IDataset() = default;
 IEncodedBlocks::~IEncodedBlocks() = default;
 IEphemerisDataset::~IEphemerisDataset() = default;
+IEphemerisRecords::~IEphemerisRecords() = default;
 IFileFormat::~IFileFormat() = default;
 IFileIOBuilder::~IFileIOBuilder() = default;
 IGeocodedDataset::~IGeocodedDataset() = default;
 IHistoryIO::~IHistoryIO() = default;
+ILinkedDataset::~ILinkedDataset() = default;
 IMathModelDataset::~IMathModelDataset() = default;
 INewFileDataset::~INewFileDataset() = default;
 IOverviewIO::~IOverviewIO() = default;

@@ -3,6 +3,7 @@
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/iencodedblocks.h"
 #include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/istoragedataset.h"
@@ -27,12 +28,14 @@ namespace krv::plugins::tif
 {
 
 // A TIFF file: the image is its first page. Reduced pages are its levels, mask pages its bitmaps, the colour map its
-// pseudocolour table (number 1, of channel 1). Opening for reading reads the first page only; the rest is looked at
+// pseudocolour table (number 1, of channel 1), tag 50844 its sensor model (number 3, behind those that lie beside the
+// file). Opening for reading reads the first page only; the rest is looked at
 // when it is asked for. With an editor the file can be changed.
 class TifDataset : public support::Dataset,
                    public krv::datasources::IGeocodedDataset,
                    public krv::datasources::IBitmapDataset,
                    public krv::datasources::IPCTDataset,
+                   public krv::datasources::IMathModelDataset,
                    public krv::datasources::IStorageDataset,
                    public krv::datasources::IPagedDataset,
                    public krv::datasources::IEncodedBlocks
@@ -84,6 +87,15 @@ public:
     void UpdatePCT(unsigned int nPCT, const krv::gobs::PCT& oTable) override;
     void SetPCTDescription(unsigned int nPCT, const std::string& oDescription) override;
     void DeletePCT(unsigned int nPCT) override;
+
+    bool HasMathModel() const override { return !GetMathModelList().empty(); }
+    std::vector<unsigned int> GetMathModelList() const override;
+    krv::mathmodel::IMathModel* GetMathModel(unsigned int nSegment) override;
+    // The file has one place for a model: a new one takes it. Throws DataException for any other than a rational
+    // polynomial one.
+    unsigned int CreateMathModel(const krv::mathmodel::IMathModel& oModel) override;
+    // Models beside the file stay.
+    void DeleteMathModel(unsigned int nSegment) override;
 
     unsigned int CountFurtherImages() const override;
 

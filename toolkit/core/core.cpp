@@ -11,8 +11,11 @@
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
+#include <filesystem>
 #include <memory>
 #include <mutex>
+#include <new>
+#include <system_error>
 #include <vector>
 
 namespace
@@ -120,6 +123,24 @@ std::string IMPGetEnv(const std::string& name)
 std::string IMPMunge(const std::string& fileName)
 {
     return fileName;
+}
+
+char* IMPMakeRelativePath(const std::string& target, const std::string& source)
+{
+    // Where a path really is but for its last component; as far as it exists.
+    const auto Place = [](const std::string& name)
+    {
+        std::error_code oNone;
+        const std::filesystem::path oAbsolute = std::filesystem::absolute(name, oNone).lexically_normal();
+        const std::filesystem::path oFolder = std::filesystem::weakly_canonical(oAbsolute.parent_path(), oNone);
+        return oNone ? oAbsolute : oFolder / oAbsolute.filename();
+    };
+    const std::string path = Place(source).lexically_relative(Place(target).parent_path()).string();
+    auto* const pText = static_cast<char*>(std::malloc(path.size() + 1));
+    if (pText == nullptr)
+        throw std::bad_alloc();
+    std::memcpy(pText, path.c_str(), path.size() + 1);
+    return pText;
 }
 
 void* IMPOpenLibrary(const std::string& fileName)

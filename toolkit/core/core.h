@@ -13,6 +13,11 @@ KRV_TOOLKIT_API std::string IMPGetEnv(const std::string& name);
 // The name under which the operating system knows a file. File names need no change on this platform.
 KRV_TOOLKIT_API std::string IMPMunge(const std::string& fileName);
 
+// The path of a file as it is written in another one that refers to it: from the folder of `target` to `source`, never
+// absolute. Both are taken from the working folder. Folders count by where they really are, the last component of
+// `source` stays as it is, a symbolic link too. The caller releases the text with free. Throws std::bad_alloc alone.
+KRV_TOOLKIT_API char* IMPMakeRelativePath(const std::string& target, const std::string& source);
+
 // Loads a shared library and returns its handle, or null with the system's last error number set: ENOENT when there is
 // no such library, ENOEXEC when it is there and cannot be loaded. A name with a separator is a path; other names are
 // looked for on the system's search path. The library is never unloaded here.

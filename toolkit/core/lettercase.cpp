@@ -12,4 +12,13 @@ std::string ToUpper(std::string_view text)
     return upper;
 }
 
+std::string ToLower(std::string_view text)
+{
+    std::string lower(text);
+    for (char& nCharacter : lower)
+        if (nCharacter >= 'A' && nCharacter <= 'Z')
+            nCharacter = static_cast<char>(nCharacter - 'A' + 'a');
+    return lower;
+}
+
 } // namespace krv

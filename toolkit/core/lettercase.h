@@ -8,8 +8,9 @@
 namespace krv
 {
 
-// The text with the letters a to z as capitals. ASCII alone changes: names of formats, options and systems do not
-// depend on the locale.
+// The text with the letters a to z as capitals, and the other way. ASCII alone changes: names of formats, options and
+// systems do not depend on the locale.
 KRV_TOOLKIT_API std::string ToUpper(std::string_view text);
+KRV_TOOLKIT_API std::string ToLower(std::string_view text);
 
 } // namespace krv

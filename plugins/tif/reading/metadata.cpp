@@ -4,9 +4,11 @@
 #include "plugins/tif/reading/tiffvalues.h"
 #include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/mathmodel/rpccoefficients.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 #include "toolkit/xml/xmltree.h"
 
+#include <algorithm>
 #include <charconv>
 #include <map>
 #include <string_view>
@@ -77,10 +79,11 @@ void ReadGeography(TIFF* poTiff, AuxiliaryData& oData)
     if (!ReadShorts(poTiff, TAG_GEO_KEYS).empty())
         SetText(oData, "RasterType", IsPixelPoint(poTiff) ? "Point" : "Area");
     const std::vector<double> oRpc = ReadDoubles(poTiff, TAG_RPC);
-    std::string text;
-    for (std::size_t nAt = 0; oRpc.size() == RPC_VALUES && nAt < RPC_VALUES; ++nAt)
-        text += (nAt == 0 ? "" : " ") + NumberText(oRpc[nAt]);
-    SetText(oData, "RPC", text);
+    if (krv::mathmodel::RpcCoefficients::Values oValues{}; oRpc.size() == oValues.size())
+    {
+        std::copy(oRpc.begin(), oRpc.end(), oValues.begin());
+        SetText(oData, "RPC", krv::mathmodel::RpcCoefficients::FromValues(oValues).GetText());
+    }
 
     krv::ogc::cs::GeocodingInfo oInfo;
     if (ReadGeocoding(poTiff, oInfo))

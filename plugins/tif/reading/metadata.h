@@ -28,7 +28,6 @@ krv::datasources::AuxiliaryData ReadMetadata(Page& oPage, std::string* pTrouble 
 
 constexpr std::uint16_t TAG_METADATA = 42112;
 constexpr std::uint16_t TAG_RPC = 50844;
-constexpr std::size_t RPC_VALUES = 92;
 constexpr std::size_t MAXIMUM_XMP_BYTES = std::size_t{1} << 20;
 constexpr const char* RESOLUTION_UNITS[] = {"", "none", "inch", "centimetre"}; // by the tag's number
 

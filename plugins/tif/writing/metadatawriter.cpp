@@ -6,6 +6,7 @@
 #include "plugins/tif/writing/metadataitems.h"
 #include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/mathmodel/rpccoefficients.h"
 
 #include <algorithm>
 #include <cmath>
@@ -256,7 +257,7 @@ private:
     {
         mpoPage->moTags.Remove(TAG_RPC);
         const std::optional<std::vector<double>> oNumbers = ParseNumbers(value);
-        if (value.empty() || !oNumbers || oNumbers->size() != RPC_VALUES)
+        if (value.empty() || !oNumbers || oNumbers->size() != krv::mathmodel::RpcCoefficients::COUNT)
             return value.empty();
         mpoPage->moTags.SetDoubles(TAG_RPC, *oNumbers);
         return true;

@@ -8,6 +8,7 @@
 #include "datasources/interfaces/ifileiobuilder.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
+#include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/interfaces/ioverviewio.h"
@@ -126,7 +127,10 @@ std::vector<Table> Tables()
          {Slot(&MM::HasMathModel), Slot(&MM::GetMathModelList), Slot(&MM::GetMathModel), Slot(&MM::CreateMathModel),
           Slot(&MM::DeleteMathModel)}},
         {"IEphemerisDataset",
-         {Slot(&EP::HasEphemeris), Slot(&EP::GetEphemerisList), Slot(&EP::DeleteEphemeris), Slot(&EP::BuildMathModel)}},
+         {Slot(&EP::HasEphemeris), Slot(&EP::GetEphemerisList), Slot(&EP::DeleteEphemeris), Slot(&EP::BuildMathModel),
+          Slot(&EP::CreateEphemeris)}},
+        {"IEphemerisRecords", {Slot(&IEphemerisRecords::ReadEphemeris)}},
+        {"ILinkedDataset", {Slot(&ILinkedDataset::GetLinkedFiles)}},
         {"IFileFormat",
          {Slot(&IFileFormat::GetDescription), Slot(&IFileFormat::GetExtensions), Slot(&IFileFormat::GetShortName)}},
         {"IFileIOBuilder",

@@ -1,0 +1,46 @@
+#include "plugins/support/sidecar/modelsidecars.h"
+
+#include "plugins/support/sidecar/rpctext.h"
+#include "plugins/support/sidecar/sidecarfile.h"
+#include "toolkit/exceptions/exceptions.h"
+
+namespace krv::plugins::support
+{
+
+namespace
+{
+
+constexpr std::size_t MAXIMUM_BYTES = std::size_t{1} << 16; // such texts have three thousand or so
+
+struct Kind
+{
+    unsigned int mnModel;
+    const char* mpEnding;
+    krv::mathmodel::RpcCoefficients (*mpParse)(const std::string& text, const std::string& fileName);
+};
+
+constexpr Kind KINDS[] = {{1, "_RPC.TXT", &ParseRpcText}, {2, ".rpb", &ParseRpb}};
+
+} // namespace
+
+std::vector<unsigned int> FindModelSidecars(const std::string& fileName)
+{
+    std::vector<unsigned int> oNumbers;
+    for (const Kind& oKind : KINDS)
+        if (!FindSidecar(fileName, oKind.mpEnding).empty())
+            oNumbers.push_back(oKind.mnModel);
+    return oNumbers;
+}
+
+krv::mathmodel::RpcCoefficients ReadModelSidecar(const std::string& fileName, unsigned int nModel)
+{
+    for (const Kind& oKind : KINDS)
+    {
+        const std::string sidecar = oKind.mnModel == nModel ? FindSidecar(fileName, oKind.mpEnding) : std::string();
+        if (!sidecar.empty())
+            return oKind.mpParse(ReadSidecar(sidecar, MAXIMUM_BYTES), sidecar);
+    }
+    throw DataException(fileName + ": there is no sensor model " + std::to_string(nModel));
+}
+
+} // namespace krv::plugins::support

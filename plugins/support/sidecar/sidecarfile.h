@@ -1,0 +1,18 @@
+#pragma once
+
+#include <cstddef>
+#include <string>
+
+namespace krv::plugins::support
+{
+
+// The file that lies beside another one under its name with an ending, such as "_RPC.TXT", in place of the extension;
+// empty when there is none. Looked for by exact names, never by listing the folder: the ending as it is given, in small
+// letters and in capitals, then the whole name in small letters and in capitals.
+std::string FindSidecar(const std::string& fileName, const std::string& ending);
+
+// All of a sidecar. Throws FileFormatException when it has more than nMaximum bytes, and what opening and reading
+// throw.
+std::string ReadSidecar(const std::string& sidecar, std::size_t nMaximum);
+
+} // namespace krv::plugins::support
