@@ -1,0 +1,53 @@
+#pragma once
+
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "toolkit/exceptions/place.h"
+
+#include <string>
+#include <vector>
+
+namespace krv::datasources
+{
+
+// The base of datasets that no file lies behind: they have a descriptive name, no format, and nothing that could be
+// deleted. What a derived class does not override is refused with a DataException that names the dataset.
+class KRV_DATASOURCES_API FilelessDataset : public IDataset, public IRasterDataset, public IGeocodedDataset
+{
+public:
+    ~FilelessDataset() override;
+    FilelessDataset& operator=(const FilelessDataset&) = delete;
+
+    IFileFormat* GetFileFormat() const override { return nullptr; }
+    FileAccessState Delete() override { return eDone; }
+    bool Exists() const override { return true; }
+    std::string GetName() override { return moName; }
+    bool IsLinked() const override { return false; }
+    void Synchronize() override { CheckOpen(); }
+    bool IsOpen() const override { return mbOpen; }
+    void Close() override { mbOpen = false; }
+
+    void AddNewChannel(const krv::gobs::RasterInfo& oInfo) override;
+    void DeleteChannel(unsigned int nChannel) override;
+    void Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes) override;
+    void Create(const krv::gobs::RasterInfo& oInfo) override;
+    IHistoryIO* GetHistoryIO(unsigned int) override { return nullptr; }
+    IOverviewManager* GetOverviewManager() override { return nullptr; }
+    AccessCapabilities GetRasterCapabilities() override { return {true, false, false}; }
+
+protected:
+    explicit FilelessDataset(std::string name);
+    FilelessDataset(const FilelessDataset&) = default;
+
+    void CheckOpen(const Place& oPlace = Place::Current()) const;
+    [[noreturn]] void Refuse(const std::string& what, const Place& oPlace = Place::Current()) const;
+    // Throws the DataException of a record with another number of channels than the image has.
+    void CheckRecord(const AuxiliaryData& oData, const Place& oPlace = Place::Current()) const;
+
+private:
+    std::string moName;
+    bool mbOpen = true;
+};
+
+} // namespace krv::datasources
