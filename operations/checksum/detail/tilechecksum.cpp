@@ -19,8 +19,8 @@ namespace krv::operations::detail
 namespace
 {
 
-// Rows of pixels and a plane of them stay in the nearest cache.
-constexpr std::size_t PIECE_BYTES = 16384;
+// Rows of pixels and a plane of them stay in a cache near by.
+constexpr std::size_t PIECE_BYTES = 65536;
 
 std::uint32_t Shift(std::uint32_t nSum, std::uint64_t nBytes)
 {
@@ -81,8 +81,8 @@ std::vector<std::uint32_t> TileChecksum::Compute(const krv::gobs::Raster& oTile,
         for (std::size_t c = 0; c < nChannels; ++c)
         {
             if (nChannels > 1)
-                raster::ExtractChannel(pPixels, nPitch, c, nChannels, oScratch.data(), nRowBytes,
-                                       {nWidth, nRows, mnValueBytes});
+                raster::ExtractChannel(pPixels, nRows * nPitch, c, nChannels, oScratch.data(), nRows * nRowBytes,
+                                       {nRows * nWidth, 1, mnValueBytes}); // rows without gaps are a long one
             oSums[c] = AddRows(oSums[c], nChannels > 1 ? oScratch.data() : pPixels, nRowBytes, nRows);
         }
     }
