@@ -23,8 +23,8 @@ struct Plane
 
 // Reduces an image to planes of any smaller size, whose values are not rounded to the image's type as those of levels
 // are. Values that are no-data, not a number or infinite are not valid. Sum works on a tile by itself, on any thread;
-// one thread adds the sums of all tiles in their order, so that the planes are the same whoever made them. Holds sums for
-// the rows of one row of tiles.
+// one thread adds the sums of all tiles in their order, so that the planes are the same whoever made them. Holds sums
+// for the rows of one row of tiles.
 class KRV_GOBS_API PlaneReducer
 {
 public:

@@ -283,7 +283,7 @@ FileWorkers<Worker>::MakeWorker MakeMaskers(const SourceFile& oFile, const MaskR
     const TileMasker oPolygons = oRequest.polygons.empty() ? TileMasker() : MaskPolygons(oFile, oRequest);
     return [&oRequest, oPolygons](FilePointer poFile)
     {
-        TileMasker oMasker = oPolygons          ? oPolygons
+        TileMasker oMasker = oPolygons         ? oPolygons
                              : oRequest.noData ? MaskNoData(*poFile, oRequest)
                                                : MaskBitmaps(*poFile, oRequest);
         return std::make_unique<Worker>(std::move(poFile), std::move(oMasker));
@@ -330,7 +330,8 @@ MaskResult MakeMask(const SourceFile& oFile, const MaskRequest& oRequest, const 
             const FileWorkers<Worker>::Use oWorker(oWorkers);
             const krv::gobs::Tile oTile = oTiles.GetTile(static_cast<unsigned int>(nTile));
             const RasterContext oContext(static_cast<int>(oTile.GetX()), static_cast<int>(oTile.GetY()));
-            MaskPointer poMask = oWorker->masker({oTile.GetWidth(), oTile.GetHeight(), 1, krv::gobs::eDT_BIT}, oContext);
+            MaskPointer poMask =
+                oWorker->masker({oTile.GetWidth(), oTile.GetHeight(), 1, krv::gobs::eDT_BIT}, oContext);
             const std::uint64_t nSet = poMask->CountSet();
             return TileMask{std::move(poMask), nSet};
         },

@@ -73,7 +73,6 @@ struct MaskResult
 // pixels. oFile: opened for update when the request is writing. When something fails it stays as it was. Throws
 // RequestException for a second validity mask.
 KRV_OPERATIONS_API MaskResult MakeMask(const SourceFile& oFile, const MaskRequest& oRequest,
-                                       const Progress& oProgress = {},
-                                       krv::threading::IExecutor* poExecutor = nullptr);
+                                       const Progress& oProgress = {}, krv::threading::IExecutor* poExecutor = nullptr);
 
 } // namespace krv::operations

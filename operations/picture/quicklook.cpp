@@ -73,8 +73,7 @@ std::vector<Plane> ReadPlanes(const SourceFile& oFile, const std::vector<unsigne
         {
             return oSource.ReadAtLeast(oGroups[g].channels, oSize.width, oSize.height);
         };
-        auto oFound =
-            Reduce(oFile, Read, oNoData, oSize.width, oSize.height, eMethod, oCounter, oThreads.executor);
+        auto oFound = Reduce(oFile, Read, oNoData, oSize.width, oSize.height, eMethod, oCounter, oThreads.executor);
         for (std::size_t i = 0; i < oFound.size(); ++i)
             oPlanes[oGroups[g].positions[i]] = std::move(oFound[i]);
     }

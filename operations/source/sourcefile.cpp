@@ -118,8 +118,9 @@ std::unique_ptr<SourceFile> SourceFile::OpenAgain() const
         auto poAgain = std::make_unique<SourceFile>(moName);
         // What this process writes into a file that it updates changes size and time, not what is opened.
         const Identity oNow(moName);
-        const bool bSame = meMode == eReadOnly ? poAgain->moIdentity == moIdentity && oNow == moIdentity
-                                               : oNow.mnNode == moIdentity.mnNode && oNow.mnDevice == moIdentity.mnDevice;
+        const bool bSame = meMode == eReadOnly
+                               ? poAgain->moIdentity == moIdentity && oNow == moIdentity
+                               : oNow.mnNode == moIdentity.mnNode && oNow.mnDevice == moIdentity.mnDevice;
         return bSame ? std::move(poAgain) : nullptr;
     }
     catch (const krv::Exception&)

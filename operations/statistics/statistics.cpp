@@ -466,8 +466,7 @@ std::unique_ptr<ValiditySource> FindValidity(const SourceFile& oFile, const std:
 // One result per channel of a group, which are all of one type. Tiles are gathered each for itself and merged in their
 // order, so that sums of reals come out the same whoever gathers them.
 std::vector<ChannelStatistics> StatisticsOf(const SourceFile& oFile, const std::vector<unsigned int>& oChannels,
-                                            bool bRaw, const Progress& oProgress,
-                                            krv::threading::IExecutor* poExecutor)
+                                            bool bRaw, const Progress& oProgress, krv::threading::IExecutor* poExecutor)
 {
     std::vector<OptionalNoData> oNoData;
     for (const unsigned int nChannel : oChannels)
@@ -484,9 +483,9 @@ std::vector<ChannelStatistics> StatisticsOf(const SourceFile& oFile, const std::
     const LevelReader oWhole = oFile.Read(oChannels);
     const krv::datasources::IRasterReader& oReader = oWhole.Get();
     const Gatherers oTotal = MakeGatherers(oReader.GetDataType(), oNoData);
-    ProgressCounter oCounter(
-        oProgress, "stats",
-        krv::gobs::BufferBytes(oReader.GetWidth(), oReader.GetHeight(), oReader.GetChansCount(), oReader.GetDataType()));
+    ProgressCounter oCounter(oProgress, "stats",
+                             krv::gobs::BufferBytes(oReader.GetWidth(), oReader.GetHeight(), oReader.GetChansCount(),
+                                                    oReader.GetDataType()));
     krv::threading::TaskGroup oThreads(poExecutor, [&oCounter] { oCounter.Repeat(); });
     krv::threading::ForEachItem(
         oThreads, oReader.GetTileCount(),

@@ -71,8 +71,9 @@ struct StatisticsRequest
 
 // One result for each channel that is asked for, in that order. Throws RequestException for a channel that is not
 // there. The results are the same for any number of threads.
-KRV_OPERATIONS_API std::vector<ChannelStatistics>
-ComputeStatistics(const SourceFile& oFile, const StatisticsRequest& oRequest, const Progress& oProgress = {},
-                  krv::threading::IExecutor* poExecutor = nullptr);
+KRV_OPERATIONS_API std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile,
+                                                                    const StatisticsRequest& oRequest,
+                                                                    const Progress& oProgress = {},
+                                                                    krv::threading::IExecutor* poExecutor = nullptr);
 
 } // namespace krv::operations

@@ -74,8 +74,8 @@ TEST(Threads, EveryVerbGivesTheSameOfAScene)
 
 TEST(Threads, NumbersThatMakeNoSenseAreRefused)
 {
-    krv::test::ExpectRefusals("checksum", {{{"x.tif", "--threads", "0"}, 2, "threads"},
-                                           {{"x.tif", "--threads", "many"}, 2, "threads"}});
+    krv::test::ExpectRefusals(
+        "checksum", {{{"x.tif", "--threads", "0"}, 2, "threads"}, {{"x.tif", "--threads", "many"}, 2, "threads"}});
 }
 
 } // namespace krv::tool

@@ -10,8 +10,8 @@
 namespace krv::threading
 {
 
-// What a task needs for itself while it runs, such as a reader of its own: taken when it begins, made when none is free,
-// given back at its end. There are never more than tasks that run at one time.
+// What a task needs for itself while it runs, such as a reader of its own: taken when it begins, made when none is
+// free, given back at its end. There are never more than tasks that run at one time.
 template <typename T>
 class StateStore
 {

@@ -30,8 +30,7 @@ std::uint32_t Shift(std::uint32_t nSum, std::uint64_t nBytes)
 } // namespace
 
 TileChecksum::TileChecksum(const krv::datasources::IRasterReader& oReader)
-    : mnWidth(oReader.GetWidth()), mnHeight(oReader.GetHeight()),
-      mnValueBytes(oReader.GetDataType().GetValueBits() / 8)
+    : mnWidth(oReader.GetWidth()), mnHeight(oReader.GetHeight()), mnValueBytes(oReader.GetDataType().GetValueBits() / 8)
 {
     // The shift is linear: what it makes of each bit gives all the rest.
     const auto nOperator = crc32_combine_gen(static_cast<z_off_t>(mnWidth * mnValueBytes));
@@ -40,8 +39,7 @@ TileChecksum::TileChecksum(const krv::datasources::IRasterReader& oReader)
         moRowShift[nByte][0] = 0;
         for (unsigned int nBit = 0; nBit < 8; ++nBit)
         {
-            const auto nShifted =
-                static_cast<std::uint32_t>(crc32_combine_op(1UL << (8 * nByte + nBit), 0, nOperator));
+            const auto nShifted = static_cast<std::uint32_t>(crc32_combine_op(1UL << (8 * nByte + nBit), 0, nOperator));
             for (unsigned int n = 0; n < 1U << nBit; ++n)
                 moRowShift[nByte][(1U << nBit) + n] = moRowShift[nByte][n] ^ nShifted;
         }
