@@ -79,90 +79,60 @@ struct Grid
     Axis rows;
 };
 
-// Sums one channel of rasters into its plane.
-class PlaneBuilder
+// The target pixels that a tile's pixels go to.
+struct Region
+{
+    unsigned int left = 0;
+    unsigned int top = 0;
+    unsigned int width = 0;
+    unsigned int height = 0;
+};
+
+// One channel of them.
+struct ChannelSums
+{
+    std::vector<double> sums;
+    std::vector<unsigned int> counts; // of valid source pixels
+};
+
+// Sums one channel of a tile.
+class ChannelReducer
 {
 public:
-    PlaneBuilder(unsigned int nWidth, unsigned int nHeight)
-        : moSums(nWidth), moCounts(nWidth), moPlane{nWidth, nHeight, {}, {}}
-    {
-        moPlane.values.resize(static_cast<std::size_t>(nWidth) * nHeight);
-        moPlane.coverage.resize(moPlane.values.size());
-    }
-    virtual ~PlaneBuilder() = default;
+    virtual ~ChannelReducer() = default;
 
     // oColumns: the runs of the tile's columns.
-    virtual void AddTile(const Raster& oTile, unsigned int nChannel, const std::vector<Run>& oColumns,
-                         const Axis& oRows) = 0;
-
-    // Means and shares of the target rows [nFirst, nEnd), which are complete.
-    void Finish(unsigned int nFirst, unsigned int nEnd, const Grid& oGrid)
-    {
-        for (unsigned int y = nFirst; y < nEnd; ++y)
-        {
-            const std::size_t nFrom = static_cast<std::size_t>(y - mnFirstRow) * moPlane.width;
-            const std::size_t nTo = static_cast<std::size_t>(y) * moPlane.width;
-            for (unsigned int x = 0; x < moPlane.width && nFrom + x < moCounts.size(); ++x)
-            {
-                const double nCount = moCounts[nFrom + x];
-                moPlane.values[nTo + x] = nCount > 0 ? static_cast<float>(moSums[nFrom + x] / nCount) : 0.0F;
-                moPlane.coverage[nTo + x] =
-                    static_cast<float>(nCount / (1.0 * oGrid.columns.CountOf(x) * oGrid.rows.CountOf(y)));
-            }
-        }
-        const auto nGone = static_cast<std::ptrdiff_t>(
-            std::min(static_cast<std::size_t>(nEnd - mnFirstRow) * moPlane.width, moCounts.size()));
-        moSums.erase(moSums.begin(), moSums.begin() + nGone);
-        moCounts.erase(moCounts.begin(), moCounts.begin() + nGone);
-        mnFirstRow = nEnd;
-    }
-
-    Plane TakePlane() { return std::move(moPlane); }
-
-protected:
-    // Room for a target row in the sums.
-    std::size_t RowStart(unsigned int nRow)
-    {
-        const std::size_t nStart = static_cast<std::size_t>(nRow - mnFirstRow) * moPlane.width;
-        if (moSums.size() < nStart + moPlane.width)
-        {
-            moSums.resize(nStart + moPlane.width);
-            moCounts.resize(nStart + moPlane.width);
-        }
-        return nStart;
-    }
-
-    std::vector<double> moSums; // target rows from mnFirstRow on
-    std::vector<unsigned int> moCounts;
-    Plane moPlane;
-    unsigned int mnFirstRow = 0;
+    virtual ChannelSums Sum(const Raster& oTile, unsigned int nChannel, const std::vector<Run>& oColumns,
+                            const Axis& oRows, const Region& oRegion) const = 0;
 };
 
 template <typename T>
-class TypedBuilder : public PlaneBuilder
+class TypedReducer : public ChannelReducer
 {
 public:
-    TypedBuilder(unsigned int nWidth, unsigned int nHeight, const std::optional<SampleValue>& oNoData, bool bComplex)
-        : PlaneBuilder(nWidth, nHeight), moNoData(oNoData), mbComplex(bComplex)
-    {
-    }
+    TypedReducer(const std::optional<SampleValue>& oNoData, bool bComplex) : moNoData(oNoData), mbComplex(bComplex) {}
 
-    void AddTile(const Raster& oTile, unsigned int nChannel, const std::vector<Run>& oColumns,
-                 const Axis& oRows) override
+    ChannelSums Sum(const Raster& oTile, unsigned int nChannel, const std::vector<Run>& oColumns, const Axis& oRows,
+                    const Region& oRegion) const override
     {
+        ChannelSums oSums;
+        oSums.sums.resize(std::size_t{oRegion.width} * oRegion.height);
+        oSums.counts.resize(oSums.sums.size());
         const unsigned int nParts = mbComplex ? 2 : 1, nStride = oTile.GetChansCount() * nParts;
         const T* pPixels = reinterpret_cast<const T*>(oTile.GetBuffer()) + nChannel * nParts;
         for (unsigned int r = 0; r < oTile.GetHeight(); ++r)
         {
             const unsigned int nRow = oRows.TargetOf(static_cast<unsigned int>(oTile.GetY()) + r);
-            if (nRow < moPlane.height)
+            if (nRow - oRegion.top < oRegion.height)
                 AddRow(pPixels + static_cast<std::size_t>(r) * oTile.GetWidth() * nStride, nStride, oColumns,
-                       RowStart(nRow));
+                       std::size_t{nRow - oRegion.top} * oRegion.width, oRegion.left, oSums);
         }
+        return oSums;
     }
 
 private:
-    void AddRow(const T* pPixels, unsigned int nStride, const std::vector<Run>& oColumns, std::size_t nRowStart)
+    void AddRow(const T* pPixels, unsigned int nStride, const std::vector<Run>& oColumns, std::size_t nRowStart,
+                unsigned int nLeft, ChannelSums& oSums) const
     {
         for (const Run& oRun : oColumns)
         {
@@ -171,8 +141,8 @@ private:
             const double nSum = std::is_integral_v<T> && !mbComplex && !moNoData.IsSet()
                                     ? SumAll(pRun, nStride, oRun.count)
                                     : SumValid(pRun, nStride, nValid);
-            moSums[nRowStart + oRun.target] += nSum;
-            moCounts[nRowStart + oRun.target] += nValid;
+            oSums.sums[nRowStart + (oRun.target - nLeft)] += nSum;
+            oSums.counts[nRowStart + (oRun.target - nLeft)] += nValid;
         }
     }
 
@@ -219,15 +189,89 @@ private:
     bool mbComplex;
 };
 
-std::unique_ptr<PlaneBuilder> MakeBuilder(const DataType& oType, unsigned int nWidth, unsigned int nHeight,
-                                          const std::optional<SampleValue>& oNoData)
+std::unique_ptr<ChannelReducer> MakeReducer(const DataType& oType, const std::optional<SampleValue>& oNoData)
 {
     return VisitPartType(oType,
-                         [&]<class Part>(std::type_identity<Part>) -> std::unique_ptr<PlaneBuilder>
-                         { return std::make_unique<TypedBuilder<Part>>(nWidth, nHeight, oNoData, oType.IsComplex()); });
+                         [&]<class Part>(std::type_identity<Part>) -> std::unique_ptr<ChannelReducer>
+                         { return std::make_unique<TypedReducer<Part>>(oNoData, oType.IsComplex()); });
 }
 
+// Adds the sums of one channel to its plane.
+class PlaneBuilder
+{
+public:
+    PlaneBuilder(unsigned int nWidth, unsigned int nHeight) : moPlane{nWidth, nHeight, {}, {}}
+    {
+        moPlane.values.resize(static_cast<std::size_t>(nWidth) * nHeight);
+        moPlane.coverage.resize(moPlane.values.size());
+    }
+
+    void Add(const ChannelSums& oSums, const Region& oRegion)
+    {
+        for (unsigned int r = 0; r < oRegion.height; ++r)
+        {
+            const std::size_t nTo = RowStart(oRegion.top + r) + oRegion.left, nFrom = std::size_t{r} * oRegion.width;
+            for (unsigned int x = 0; x < oRegion.width; ++x)
+            {
+                moSums[nTo + x] += oSums.sums[nFrom + x];
+                moCounts[nTo + x] += oSums.counts[nFrom + x];
+            }
+        }
+    }
+
+    // Means and shares of the target rows [nFirst, nEnd), which are complete.
+    void Finish(unsigned int nFirst, unsigned int nEnd, const Grid& oGrid)
+    {
+        for (unsigned int y = nFirst; y < nEnd; ++y)
+        {
+            const std::size_t nFrom = static_cast<std::size_t>(y - mnFirstRow) * moPlane.width;
+            const std::size_t nTo = static_cast<std::size_t>(y) * moPlane.width;
+            for (unsigned int x = 0; x < moPlane.width && nFrom + x < moCounts.size(); ++x)
+            {
+                const double nCount = moCounts[nFrom + x];
+                moPlane.values[nTo + x] = nCount > 0 ? static_cast<float>(moSums[nFrom + x] / nCount) : 0.0F;
+                moPlane.coverage[nTo + x] =
+                    static_cast<float>(nCount / (1.0 * oGrid.columns.CountOf(x) * oGrid.rows.CountOf(y)));
+            }
+        }
+        const auto nGone = static_cast<std::ptrdiff_t>(
+            std::min(static_cast<std::size_t>(nEnd - mnFirstRow) * moPlane.width, moCounts.size()));
+        moSums.erase(moSums.begin(), moSums.begin() + nGone);
+        moCounts.erase(moCounts.begin(), moCounts.begin() + nGone);
+        mnFirstRow = nEnd;
+    }
+
+    Plane TakePlane() { return std::move(moPlane); }
+
+private:
+    // Room for a target row in the sums.
+    std::size_t RowStart(unsigned int nRow)
+    {
+        const std::size_t nStart = static_cast<std::size_t>(nRow - mnFirstRow) * moPlane.width;
+        if (moSums.size() < nStart + moPlane.width)
+        {
+            moSums.resize(nStart + moPlane.width);
+            moCounts.resize(nStart + moPlane.width);
+        }
+        return nStart;
+    }
+
+    std::vector<double> moSums; // target rows from mnFirstRow on
+    std::vector<unsigned int> moCounts;
+    Plane moPlane;
+    unsigned int mnFirstRow = 0;
+};
+
 } // namespace
+
+class PlaneReducer::Sums
+{
+public:
+    Region region;
+    std::vector<ChannelSums> channels;
+    unsigned int right; // of the tile in the image, and its bottom
+    unsigned int bottom;
+};
 
 class PlaneReducer::Implementation
 {
@@ -241,22 +285,40 @@ public:
             throw krv::ParameterException("Planes are reduced by AVERAGE or NEAREST",
                                           krv::ParameterException::eInvalidValue, "eMethod");
         for (const std::optional<SampleValue>& oValue : oNumbers)
-            moBuilders.push_back(MakeBuilder(oType, nWidth, nHeight, oValue));
+        {
+            moReducers.push_back(MakeReducer(oType, oValue));
+            moBuilders.emplace_back(nWidth, nHeight);
+        }
     }
 
-    void Add(const Raster& oTile)
+    std::shared_ptr<const Sums> Sum(const Raster& oTile) const
     {
         const auto oColumns = moGrid.columns.RunsOf(static_cast<unsigned int>(oTile.GetX()), oTile.GetWidth());
-        for (unsigned int c = 0; c < moBuilders.size(); ++c)
-            moBuilders[c]->AddTile(oTile, c, oColumns, moGrid.rows);
-        if (static_cast<unsigned int>(oTile.GetX()) + oTile.GetWidth() < mnSourceWidth)
+        const auto oRows = moGrid.rows.RunsOf(static_cast<unsigned int>(oTile.GetY()), oTile.GetHeight());
+        const auto poSums = std::make_shared<Sums>();
+        poSums->right = static_cast<unsigned int>(oTile.GetX()) + oTile.GetWidth();
+        poSums->bottom = static_cast<unsigned int>(oTile.GetY()) + oTile.GetHeight();
+        if (oColumns.empty() || oRows.empty())
+            return poSums;
+        poSums->region = {oColumns.front().target, oRows.front().target,
+                          oColumns.back().target - oColumns.front().target + 1,
+                          oRows.back().target - oRows.front().target + 1};
+        for (unsigned int c = 0; c < moReducers.size(); ++c)
+            poSums->channels.push_back(moReducers[c]->Sum(oTile, c, oColumns, moGrid.rows, poSums->region));
+        return poSums;
+    }
+
+    void Add(const Sums& oSums)
+    {
+        for (std::size_t c = 0; c < oSums.channels.size(); ++c)
+            moBuilders[c].Add(oSums.channels[c], oSums.region);
+        if (oSums.right < mnSourceWidth)
             return;
-        const unsigned int nEnd = static_cast<unsigned int>(oTile.GetY()) + oTile.GetHeight();
         unsigned int nReady = mnFinished;
-        while (nReady < mnHeight && SourceStart(nReady + 1, mnSourceHeight, mnHeight) <= nEnd)
+        while (nReady < mnHeight && SourceStart(nReady + 1, mnSourceHeight, mnHeight) <= oSums.bottom)
             ++nReady;
-        for (const auto& poBuilder : moBuilders)
-            poBuilder->Finish(mnFinished, nReady, moGrid);
+        for (PlaneBuilder& oBuilder : moBuilders)
+            oBuilder.Finish(mnFinished, nReady, moGrid);
         mnFinished = nReady;
     }
 
@@ -264,8 +326,8 @@ public:
     {
         std::vector<Plane> oPlanes;
         oPlanes.reserve(moBuilders.size());
-        for (const auto& poBuilder : moBuilders)
-            oPlanes.push_back(poBuilder->TakePlane());
+        for (PlaneBuilder& oBuilder : moBuilders)
+            oPlanes.push_back(oBuilder.TakePlane());
         return oPlanes;
     }
 
@@ -274,7 +336,8 @@ private:
     unsigned int mnSourceHeight;
     unsigned int mnHeight;
     Grid moGrid;
-    std::vector<std::unique_ptr<PlaneBuilder>> moBuilders;
+    std::vector<std::unique_ptr<const ChannelReducer>> moReducers; // one per channel
+    std::vector<PlaneBuilder> moBuilders;
     unsigned int mnFinished = 0; // rows of the planes
 };
 
@@ -287,9 +350,14 @@ PlaneReducer::PlaneReducer(const DataType& oType, unsigned int nSourceWidth, uns
 
 PlaneReducer::~PlaneReducer() = default;
 
-void PlaneReducer::Add(const Raster& oTile)
+std::shared_ptr<const PlaneReducer::Sums> PlaneReducer::Sum(const Raster& oTile) const
 {
-    mpoImplementation->Add(oTile);
+    return mpoImplementation->Sum(oTile);
+}
+
+void PlaneReducer::Add(const Sums& oSums)
+{
+    mpoImplementation->Add(oSums);
 }
 
 std::vector<Plane> PlaneReducer::TakePlanes()

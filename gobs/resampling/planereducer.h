@@ -22,10 +22,15 @@ struct Plane
 };
 
 // Reduces an image to planes of any smaller size, whose values are not rounded to the image's type as those of levels
-// are. Values that are no-data, not a number or infinite are not valid. Holds sums for the rows of one row of tiles.
+// are. Values that are no-data, not a number or infinite are not valid. Sum works on a tile by itself, on any thread;
+// one thread adds the sums of all tiles in their order, so that the planes are the same whoever made them. Holds sums
+// for the rows of one row of tiles.
 class KRV_GOBS_API PlaneReducer
 {
 public:
+    // What the pixels of a tile add to the planes.
+    class Sums;
+
     // The size of the planes is not more than that of the image. oNumbers: one per channel. eMethod: eAverage is the
     // mean of the valid source pixels that fall into a pixel, eNearest the one at their centre; ParameterException for
     // others.
@@ -33,8 +38,11 @@ public:
                  unsigned int nHeight, const NoDataNumbers& oNumbers, Resampling eMethod);
     ~PlaneReducer();
 
-    // The tiles of the image without margins, each once, row by row from the left.
-    void Add(const Raster& oTile);
+    // Of a tile of the image without margins. Any thread.
+    std::shared_ptr<const Sums> Sum(const Raster& oTile) const;
+    // The tiles of the image, each once, row by row from the left.
+    void Add(const Sums& oSums);
+    void Add(const Raster& oTile) { Add(*Sum(oTile)); }
     // After the last tile.
     std::vector<Plane> TakePlanes();
 

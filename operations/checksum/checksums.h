@@ -12,6 +12,11 @@ namespace krv::datasources
 class IRasterReader;
 }
 
+namespace krv::threading
+{
+class IExecutor;
+}
+
 namespace krv::operations
 {
 
@@ -33,15 +38,15 @@ struct Checksums
 
 // CRC-32 (the polynomial of zlib) of each channel over its pixels in row-major order, little-endian, without margins,
 // of the image or of one of its levels. No channels: all. Throws RequestException for a channel or a level that is not
-// there. Reads each tile once.
+// there. Reads each tile once; the sums are the same whatever reads how many at a time.
 KRV_OPERATIONS_API Checksums ComputeChecksums(const SourceFile& oFile, const std::vector<unsigned int>& oChannels,
-                                              unsigned int nLevel = 1, const Progress& oProgress = {});
+                                              unsigned int nLevel = 1, const Progress& oProgress = {},
+                                              krv::threading::IExecutor* poExecutor = nullptr);
 
-// The same of each channel of a reader, whose tile size changes. Memory: the pixels of a row of tiles, at most
-// MAX_BAND_BYTES whatever the size of the image.
+// The same of each channel of a reader, whose tile size changes when its tiles are larger than MAX_TILE_BYTES.
 KRV_OPERATIONS_API std::vector<std::uint32_t> ComputeChecksums(krv::datasources::IRasterReader& oReader,
                                                                const Progress& oProgress = {});
 
-constexpr std::uint64_t MAX_BAND_BYTES = 128ULL << 20U;
+constexpr std::uint64_t MAX_TILE_BYTES = 64ULL << 20U;
 
 } // namespace krv::operations

@@ -16,7 +16,8 @@ struct Amount
     std::uint64_t total = 0; // bytes of pixels, as near as is known before
 };
 
-// Called when a part begins and between pieces of work, by the thread that does the job. False stops the job, which
+// Called when a part begins, between pieces of work and while the job waits for its threads, by the thread that called
+// it. False stops the job, which
 // throws StoppedException then and leaves files as if it had failed. May throw. An empty function: nobody asks.
 using Progress = std::function<bool(const Amount&)>;
 
@@ -30,6 +31,8 @@ public:
     ProgressCounter(Progress oProgress, const char* pPart, std::uint64_t nTotal);
 
     void Advance(std::uint64_t nMore);
+    // Says the same again, so that who wants the job stopped is heard while it waits.
+    void Repeat() const { Report(moProgress, moAmount); }
 
 private:
     Progress moProgress;

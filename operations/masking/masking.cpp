@@ -17,9 +17,11 @@
 #include "operations/masking/detail/polygonplacer.h"
 #include "operations/masking/polygontext.h"
 #include "operations/picture/pngwriter.h"
+#include "operations/source/fileworkers.h"
 #include "operations/source/sourcefile.h"
 #include "toolkit/core/gglshape.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/threading/foreachitem.h"
 
 #include <fmt/format.h>
 
@@ -268,21 +270,46 @@ private:
     krv::datasources::BasicWriter moWriter;
 };
 
-TileMasker MakeMasker(const SourceFile& oFile, const MaskRequest& oRequest)
+// What a thread needs: what makes masks, and the file that it reads.
+struct Worker
 {
-    if (!oRequest.polygons.empty())
-        return MaskPolygons(oFile, oRequest);
-    return oRequest.noData ? MaskNoData(oFile, oRequest) : MaskBitmaps(oFile, oRequest);
+    FilePointer file;
+    TileMasker masker;
+};
+
+// Polygons are placed once; what makes their masks is not changed by it.
+FileWorkers<Worker>::MakeWorker MakeMaskers(const SourceFile& oFile, const MaskRequest& oRequest)
+{
+    const TileMasker oPolygons = oRequest.polygons.empty() ? TileMasker() : MaskPolygons(oFile, oRequest);
+    return [&oRequest, oPolygons](FilePointer poFile)
+    {
+        TileMasker oMasker = oPolygons         ? oPolygons
+                             : oRequest.noData ? MaskNoData(*poFile, oRequest)
+                                               : MaskBitmaps(*poFile, oRequest);
+        return std::make_unique<Worker>(std::move(poFile), std::move(oMasker));
+    };
 }
+
+struct TileMask
+{
+    MaskPointer mask;
+    std::uint64_t set;
+};
 
 } // namespace
 
-MaskResult MakeMask(const SourceFile& oFile, const MaskRequest& oRequest, const Progress& oProgress)
+MaskResult MakeMask(const SourceFile& oFile, const MaskRequest& oRequest, const Progress& oProgress,
+                    krv::threading::IExecutor* poExecutor)
 {
     const unsigned int nWidth = oFile.GetRaster().GetWidth(), nHeight = oFile.GetRaster().GetHeight();
     if (std::max(nWidth, nHeight) > static_cast<unsigned int>(std::numeric_limits<int>::max()))
         throw krv::DataException(oFile.GetName() + ": the image is too large for masks");
-    const TileMasker oMasker = MakeMasker(oFile, oRequest);
+    // A file that is written belongs to the thread that writes: others read what was there before, or nobody does.
+    const auto poRead = oRequest.IsWriting() && poExecutor != nullptr ? oFile.OpenAgain() : nullptr;
+    if (oRequest.IsWriting() && poRead == nullptr)
+        poExecutor = nullptr;
+    const SourceFile& oSource = poRead != nullptr ? *poRead : oFile;
+    FileWorkers<Worker> oWorkers(oSource, MakeMaskers(oSource, oRequest));
     std::optional<MaskPicture> oPicture;
     if (!oRequest.picture.empty())
         oPicture.emplace(nWidth, nHeight, oRequest.pictureSize);
@@ -295,18 +322,28 @@ MaskResult MakeMask(const SourceFile& oFile, const MaskRequest& oRequest, const 
     oTiles.SetChunkSize(oGrid.Get().GetTileWidth(), oGrid.Get().GetTileHeight());
     MaskResult oResult;
     ProgressCounter oCounter(oProgress, "mask", std::uint64_t{nWidth} * nHeight);
-    for (unsigned int i = 0; i != oTiles.GetTileRange() + 1; ++i)
-    {
-        const krv::gobs::Tile oTile = oTiles.GetTile(i);
-        const RasterContext oContext(static_cast<int>(oTile.GetX()), static_cast<int>(oTile.GetY()));
-        const MaskPointer poMask = oMasker({oTile.GetWidth(), oTile.GetHeight(), 1, krv::gobs::eDT_BIT}, oContext);
-        oResult.set += poMask->CountSet();
-        if (oPicture)
-            oPicture->Add(*poMask);
-        if (oTarget)
-            oTarget->Add(*poMask);
-        oCounter.Advance(std::uint64_t{oTile.GetWidth()} * oTile.GetHeight());
-    }
+    krv::threading::TaskGroup oThreads(poExecutor, [&oCounter] { oCounter.Repeat(); });
+    krv::threading::ForEachItem(
+        oThreads, oTiles.GetTileRange() + 1,
+        [&](std::uint64_t nTile)
+        {
+            const FileWorkers<Worker>::Use oWorker(oWorkers);
+            const krv::gobs::Tile oTile = oTiles.GetTile(static_cast<unsigned int>(nTile));
+            const RasterContext oContext(static_cast<int>(oTile.GetX()), static_cast<int>(oTile.GetY()));
+            MaskPointer poMask =
+                oWorker->masker({oTile.GetWidth(), oTile.GetHeight(), 1, krv::gobs::eDT_BIT}, oContext);
+            const std::uint64_t nSet = poMask->CountSet();
+            return TileMask{std::move(poMask), nSet};
+        },
+        [&](const TileMask& oTile)
+        {
+            oResult.set += oTile.set;
+            if (oPicture)
+                oPicture->Add(*oTile.mask);
+            if (oTarget)
+                oTarget->Add(*oTile.mask);
+            oCounter.Advance(std::uint64_t{oTile.mask->GetWidth()} * oTile.mask->GetHeight());
+        });
     oResult.pixels = std::uint64_t{nWidth} * nHeight;
     if (oPicture)
         WritePng(oPicture->Finish(), oRequest.picture);

@@ -10,6 +10,11 @@
 #include <string>
 #include <vector>
 
+namespace krv::threading
+{
+class IExecutor;
+}
+
 namespace krv::operations
 {
 
@@ -68,6 +73,6 @@ struct MaskResult
 // pixels. oFile: opened for update when the request is writing. When something fails it stays as it was. Throws
 // RequestException for a second validity mask.
 KRV_OPERATIONS_API MaskResult MakeMask(const SourceFile& oFile, const MaskRequest& oRequest,
-                                       const Progress& oProgress = {});
+                                       const Progress& oProgress = {}, krv::threading::IExecutor* poExecutor = nullptr);
 
 } // namespace krv::operations

@@ -5,6 +5,7 @@
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/reader/basicreader.h"
+#include "datasources/reader/ioverviewaccessor.h"
 #include "gobs/pct/pct.h"
 #include "operations/job/exceptions.h"
 #include "operations/job/progress.h"
@@ -30,6 +31,13 @@ struct Size
     unsigned int height;
 };
 
+// Who works, and who is told.
+struct Threads
+{
+    const Progress& progress;
+    krv::threading::IExecutor* executor;
+};
+
 Size FitInto(unsigned int nWidth, unsigned int nHeight, unsigned int nLongest)
 {
     const double nScale = std::min(static_cast<double>(nLongest) / std::max({nWidth, nHeight, 1U}), 1.0);
@@ -48,24 +56,24 @@ std::uint64_t ReaderBytes(const krv::datasources::IRasterReader& oReader)
 
 // The planes of some channels, in their order, whatever their types.
 std::vector<Plane> ReadPlanes(const SourceFile& oFile, const std::vector<unsigned int>& oChannels, const Size& oSize,
-                              Resampling eMethod, const Progress& oProgress)
+                              Resampling eMethod, const Threads& oThreads)
 {
     const std::vector<ChannelGroup> oGroups = oFile.GroupByType(oChannels);
-    std::vector<LevelReader> oReaders;
     std::uint64_t nBytes = 0;
     for (const ChannelGroup& oGroup : oGroups)
-    {
-        oReaders.push_back(oFile.ReadAtLeast(oGroup.channels, oSize.width, oSize.height));
-        nBytes += ReaderBytes(oReaders.back().Get());
-    }
-    ProgressCounter oCounter(oProgress, "view", nBytes);
+        nBytes += ReaderBytes(oFile.ReadAtLeast(oGroup.channels, oSize.width, oSize.height).Get());
+    ProgressCounter oCounter(oThreads.progress, "view", nBytes);
     std::vector<Plane> oPlanes(oChannels.size());
     for (std::size_t g = 0; g < oGroups.size(); ++g)
     {
         std::vector<OptionalNoData> oNoData;
         for (const unsigned int nChannel : oGroups[g].channels)
             oNoData.push_back(oFile.GetNoData(nChannel));
-        auto oFound = Reduce(oReaders[g].Get(), oNoData, oSize.width, oSize.height, eMethod, oCounter);
+        const auto Read = [&](const SourceFile& oSource)
+        {
+            return oSource.ReadAtLeast(oGroups[g].channels, oSize.width, oSize.height);
+        };
+        auto oFound = Reduce(oFile, Read, oNoData, oSize.width, oSize.height, eMethod, oCounter, oThreads.executor);
         for (std::size_t i = 0; i < oFound.size(); ++i)
             oPlanes[oGroups[g].positions[i]] = std::move(oFound[i]);
     }
@@ -86,9 +94,9 @@ float FullAlpha(const Plane& oAlpha, float nFull)
 }
 
 void ApplyAlpha(const SourceFile& oFile, const DisplayChoice& oChoice, const Size& oSize, std::vector<Plane>& oPlanes,
-                std::vector<float>& oOpacity, const Progress& oProgress)
+                std::vector<float>& oOpacity, const Threads& oThreads)
 {
-    const Plane oAlpha = ReadPlanes(oFile, {oChoice.alphaChannel}, oSize, Resampling::eAverage, oProgress).front();
+    const Plane oAlpha = ReadPlanes(oFile, {oChoice.alphaChannel}, oSize, Resampling::eAverage, oThreads).front();
     const float nFull = FullAlpha(oAlpha, oChoice.alphaFull);
     Multiply(oOpacity, oAlpha, nFull);
     for (Plane& oPlane : oPlanes)
@@ -98,16 +106,27 @@ void ApplyAlpha(const SourceFile& oFile, const DisplayChoice& oChoice, const Siz
     }
 }
 
-// The bits are read at full size: levels of bitmaps are not always there.
-void ApplyMask(const SourceFile& oFile, unsigned int nBitmap, const Size& oSize, std::vector<float>& oOpacity,
-               const Progress& oProgress)
+LevelReader ReadBitmap(const SourceFile& oFile, unsigned int nBitmap)
 {
     auto* const poBitmaps = dynamic_cast<krv::datasources::IBitmapDataset*>(&oFile.GetDataset());
-    krv::datasources::BasicReader oReader(poBitmaps, {nBitmap}, false);
-    if (oReader.GetWidth() != oFile.GetRaster().GetWidth() || oReader.GetHeight() != oFile.GetRaster().GetHeight())
+    auto poReader =
+        std::make_unique<krv::datasources::BasicReader>(poBitmaps, std::vector<unsigned int>{nBitmap}, false);
+    if (poReader->GetWidth() != oFile.GetRaster().GetWidth() || poReader->GetHeight() != oFile.GetRaster().GetHeight())
         throw krv::DataException(fmt::format("{}: bitmap {} is not of the image's size", oFile.GetName(), nBitmap));
-    ProgressCounter oCounter(oProgress, "mask", ReaderBytes(oReader));
-    const auto oPlanes = Reduce(oReader, {std::nullopt}, oSize.width, oSize.height, Resampling::eAverage, oCounter);
+    return {std::move(poReader), nullptr, nullptr};
+}
+
+// The bits are read at full size: levels of bitmaps are not always there.
+void ApplyMask(const SourceFile& oFile, unsigned int nBitmap, const Size& oSize, std::vector<float>& oOpacity,
+               const Threads& oThreads)
+{
+    const auto Read = [nBitmap](const SourceFile& oSource)
+    {
+        return ReadBitmap(oSource, nBitmap);
+    };
+    ProgressCounter oCounter(oThreads.progress, "mask", ReaderBytes(Read(oFile).Get()));
+    const auto oPlanes = Reduce(oFile, Read, {std::nullopt}, oSize.width, oSize.height, Resampling::eAverage, oCounter,
+                                oThreads.executor);
     Multiply(oOpacity, oPlanes.front(), 1.0F);
 }
 
@@ -124,7 +143,7 @@ void HideTransparent(std::vector<Plane>& oPlanes, const std::vector<float>& oOpa
 // Opacity of every pixel, 0 to 1: no-data in all shown channels, the validity mask and the alpha channel together.
 // Premultiplied colours become plain ones.
 std::vector<float> FindOpacity(const SourceFile& oFile, const DisplayChoice& oChoice, const Size& oSize,
-                               std::vector<Plane>& oPlanes, const Progress& oProgress)
+                               std::vector<Plane>& oPlanes, const Threads& oThreads)
 {
     std::vector<float> oOpacity(oPlanes.front().coverage.size(), 0.0F);
     for (const Plane& oPlane : oPlanes)
@@ -133,9 +152,9 @@ std::vector<float> FindOpacity(const SourceFile& oFile, const DisplayChoice& oCh
             oOpacity[i] = std::max(oOpacity[i], oPlane.coverage[i]);
     }
     if (oChoice.alphaChannel != 0)
-        ApplyAlpha(oFile, oChoice, oSize, oPlanes, oOpacity, oProgress);
+        ApplyAlpha(oFile, oChoice, oSize, oPlanes, oOpacity, oThreads);
     if (oChoice.maskBitmap != 0)
-        ApplyMask(oFile, oChoice.maskBitmap, oSize, oOpacity, oProgress);
+        ApplyMask(oFile, oChoice.maskBitmap, oSize, oOpacity, oThreads);
     HideTransparent(oPlanes, oOpacity);
     return oOpacity;
 }
@@ -208,8 +227,10 @@ void DropOpaqueAlpha(Picture& oPicture)
 
 } // namespace
 
-QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOptions, const Progress& oProgress)
+QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOptions, const Progress& oProgress,
+                        krv::threading::IExecutor* poExecutor)
 {
+    const Threads oThreads{oProgress, poExecutor};
     const auto& oRaster = oFile.GetRaster();
     QuickLook oLook;
     oLook.choice = ChooseDisplay(oFile, oOptions.channels);
@@ -217,8 +238,8 @@ QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOption
     const Size oSize = FitInto(oRaster.GetWidth(), oRaster.GetHeight(), oOptions.size);
     const Resampling eMethod =
         oChoice.table != nullptr || !oOptions.average ? Resampling::eNearest : Resampling::eAverage;
-    std::vector<Plane> oPlanes = ReadPlanes(oFile, oChoice.channels, oSize, eMethod, oProgress);
-    std::vector<float> oOpacity = FindOpacity(oFile, oChoice, oSize, oPlanes, oProgress);
+    std::vector<Plane> oPlanes = ReadPlanes(oFile, oChoice.channels, oSize, eMethod, oThreads);
+    std::vector<float> oOpacity = FindOpacity(oFile, oChoice, oSize, oPlanes, oThreads);
 
     const bool bInks = oPlanes.size() == 4;
     if (bInks)

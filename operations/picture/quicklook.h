@@ -7,6 +7,11 @@
 
 #include <vector>
 
+namespace krv::threading
+{
+class IExecutor;
+}
+
 namespace krv::operations
 {
 
@@ -29,6 +34,7 @@ struct QuickLook
 // its colour table, and no-data, masked and transparent pixels transparent. Throws RequestException for channels that
 // are not there.
 KRV_OPERATIONS_API QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOptions,
-                                           const Progress& oProgress = {});
+                                           const Progress& oProgress = {},
+                                           krv::threading::IExecutor* poExecutor = nullptr);
 
 } // namespace krv::operations

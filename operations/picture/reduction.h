@@ -3,12 +3,19 @@
 #include "gobs/resampling/planereducer.h"
 #include "operations/api.h"
 #include "operations/job/progress.h"
+#include "operations/source/sourcefile.h"
 
+#include <functional>
 #include <vector>
 
 namespace krv::datasources
 {
 class IRasterReader;
+}
+
+namespace krv::threading
+{
+class IExecutor;
 }
 
 namespace krv::operations
@@ -22,5 +29,12 @@ using krv::gobs::Resampling;
 KRV_OPERATIONS_API std::vector<Plane> Reduce(krv::datasources::IRasterReader& oReader,
                                              const krv::gobs::NoDataNumbers& oNumbers, unsigned int nWidth,
                                              unsigned int nHeight, Resampling eMethod, ProgressCounter& oCounter);
+
+// The same of what oRead makes of the file, or of the file opened again, for each thread that takes part.
+using MakeLevelReader = std::function<LevelReader(const SourceFile& oFile)>;
+KRV_OPERATIONS_API std::vector<Plane> Reduce(const SourceFile& oFile, const MakeLevelReader& oRead,
+                                             const krv::gobs::NoDataNumbers& oNumbers, unsigned int nWidth,
+                                             unsigned int nHeight, Resampling eMethod, ProgressCounter& oCounter,
+                                             krv::threading::IExecutor* poExecutor);
 
 } // namespace krv::operations

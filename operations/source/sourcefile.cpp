@@ -88,14 +88,46 @@ LevelReader::LevelReader(std::unique_ptr<IRasterReader> poFull, std::unique_ptr<
 LevelReader::LevelReader(LevelReader&&) noexcept = default;
 LevelReader::~LevelReader() = default;
 
+SourceFile::Identity::Identity(const std::string& name)
+{
+    struct stat oStatus = {};
+    if (stat(name.c_str(), &oStatus) != 0 || !S_ISREG(oStatus.st_mode))
+        return;
+    mnDevice = oStatus.st_dev;
+    mnNode = oStatus.st_ino;
+    mnSize = oStatus.st_size;
+    mnSeconds = oStatus.st_mtim.tv_sec;
+    mnNanoseconds = oStatus.st_mtim.tv_nsec;
+}
+
 SourceFile::SourceFile(const std::string& name, AccessMode eMode)
-    : moName(name), mpoDataset(OpenDataset(name, eMode)),
+    : moName(name), meMode(eMode), moIdentity(name), mpoDataset(OpenDataset(name, eMode)),
       mpoRaster(dynamic_cast<krv::datasources::IRasterDataset*>(mpoDataset.get())),
       moMetadata(mpoDataset->ReadAuxiliaryData())
 {
 }
 
 SourceFile::~SourceFile() = default;
+
+std::unique_ptr<SourceFile> SourceFile::OpenAgain() const
+{
+    if (moIdentity.mnNode == 0)
+        return nullptr;
+    try
+    {
+        auto poAgain = std::make_unique<SourceFile>(moName);
+        // What this process writes into a file that it updates changes size and time, not what is opened.
+        const Identity oNow(moName);
+        const bool bSame = meMode == eReadOnly
+                               ? poAgain->moIdentity == moIdentity && oNow == moIdentity
+                               : oNow.mnNode == moIdentity.mnNode && oNow.mnDevice == moIdentity.mnDevice;
+        return bSame ? std::move(poAgain) : nullptr;
+    }
+    catch (const krv::Exception&)
+    {
+        return nullptr;
+    }
+}
 
 krv::datasources::IRasterDataset& SourceFile::GetRaster() const
 {

@@ -6,6 +6,7 @@
 #include "gobs/raster/datatype.h"
 #include "operations/api.h"
 
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
@@ -68,6 +69,10 @@ public:
     explicit SourceFile(const std::string& name, AccessMode eMode = eReadOnly);
     ~SourceFile();
 
+    // The same file opened once more for reading, for a thread of its own; null when that cannot be: it is another by
+    // now, or nobody else can open it. Of a file that is open for updating it shows the state on the disk. Any thread.
+    std::unique_ptr<SourceFile> OpenAgain() const;
+
     const std::string& GetName() const { return moName; }
     krv::datasources::IDataset& GetDataset() const { return *mpoDataset; }
     // Null when the file holds no image.
@@ -95,10 +100,25 @@ public:
                             unsigned int nHeight) const;
 
 private:
+    // What tells one file of a name from another.
+    struct Identity
+    {
+        explicit Identity(const std::string& name);
+        bool operator==(const Identity&) const = default;
+
+        std::uint64_t mnDevice = 0;
+        std::uint64_t mnNode = 0; // 0: it is no file that others can open
+        std::int64_t mnSize = 0;
+        std::int64_t mnSeconds = 0; // of the last change
+        std::int64_t mnNanoseconds = 0;
+    };
+
     // A format plug-in's answers need not agree.
     std::unique_ptr<krv::datasources::BasicReader> ReadFull(const std::vector<unsigned int>& oChannels) const;
 
     std::string moName;
+    AccessMode meMode;
+    Identity moIdentity; // as it was just before it was opened
     std::unique_ptr<krv::datasources::IDataset> mpoDataset;
     krv::datasources::IRasterDataset* mpoRaster; // a facet of the dataset
     krv::datasources::AuxiliaryData moMetadata;

@@ -1,13 +1,13 @@
 #include "operations/statistics/statistics.h"
 
 #include "datasources/reader/irasterreader.h"
-#include "datasources/reader/rasterrange.h"
 #include "datasources/reader/validitysource.h"
-#include "gobs/mask/imaskbuilder.h"
 #include "gobs/mask/mask.h"
 #include "gobs/mask/samplematch.h"
 #include "gobs/raster/pixelvalue.h"
 #include "gobs/raster/raster.h"
+#include "operations/source/fileworkers.h"
+#include "toolkit/threading/foreachitem.h"
 
 #include <algorithm>
 #include <array>
@@ -80,6 +80,12 @@ public:
                                                                                   static_cast<Square>(nValue));
                                             });
     }
+    void Merge(const SmallSums& oOther)
+    {
+        mnCount += oOther.mnCount;
+        mnSum += oOther.mnSum;
+        mnSquares += oOther.mnSquares;
+    }
     long double GetMean() const { return static_cast<long double>(mnSum) / static_cast<long double>(mnCount); }
     long double GetVariance() const
     {
@@ -136,6 +142,11 @@ public:
         }
         moMoments.Merge(oRun);
     }
+    void Merge(const MergedSums& oOther)
+    {
+        mnSum += oOther.mnSum;
+        moMoments.Merge(oOther.moMoments);
+    }
     long double GetMean() const { return static_cast<long double>(mnSum) / static_cast<long double>(moMoments.count); }
     long double GetVariance() const { return moMoments.squares / static_cast<long double>(moMoments.count); }
 
@@ -188,6 +199,16 @@ public:
         moSums.Add(pValues, n);
     }
 
+    void Merge(const RunStatistics& oOther)
+    {
+        if (oOther.mnCount == 0)
+            return;
+        mnLow = oOther.mnLow < mnLow ? oOther.mnLow : mnLow;
+        mnHigh = oOther.mnHigh > mnHigh ? oOther.mnHigh : mnHigh;
+        mnCount += oOther.mnCount;
+        moSums.Merge(oOther.moSums);
+    }
+
     void Report(ChannelStatistics& oResult) const
     {
         oResult.valid = mnCount;
@@ -221,11 +242,42 @@ bool IsMasked(const unsigned char* pValid, std::uint64_t nPixel)
     return (pValid[nPixel / 8] & 128u >> nPixel % 8) == 0;
 }
 
-template <typename T>
-class RealGatherer : public StatisticsGatherer
+// What gatherers of both kinds have: counts of values that take no part, and the statistics of those that do.
+template <typename T, typename Value>
+class PartGatherer : public StatisticsGatherer
 {
 public:
-    explicit RealGatherer(const OptionalNoData& oNoData) : moNoData(oNoData) {}
+    explicit PartGatherer(const OptionalNoData& oNoData) : moNoData(oNoData) {}
+
+    void Merge(const StatisticsGatherer& oOther) override
+    {
+        const auto& oSame = dynamic_cast<const PartGatherer&>(oOther);
+        moCounts.noData += oSame.moCounts.noData;
+        moCounts.masked += oSame.moCounts.masked;
+        moCounts.nan += oSame.moCounts.nan;
+        moCounts.infinite += oSame.moCounts.infinite;
+        moStatistics.Merge(oSame.moStatistics);
+    }
+
+    ChannelStatistics Get() const override
+    {
+        ChannelStatistics oResult = moCounts;
+        moStatistics.Report(oResult);
+        return oResult;
+    }
+
+protected:
+    krv::gobs::SampleMatch<T> moNoData;
+    ChannelStatistics moCounts;
+    RunStatistics<Value> moStatistics;
+    std::array<Value, RUN> moValid;
+};
+
+template <typename T>
+class RealGatherer : public PartGatherer<T, T>
+{
+public:
+    using PartGatherer<T, T>::PartGatherer;
 
     void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride,
              const unsigned char* pValid) override
@@ -244,14 +296,12 @@ public:
         }
     }
 
-    ChannelStatistics Get() const override
-    {
-        ChannelStatistics oResult = moCounts;
-        moStatistics.Report(oResult);
-        return oResult;
-    }
-
 private:
+    using PartGatherer<T, T>::moNoData;
+    using PartGatherer<T, T>::moCounts;
+    using PartGatherer<T, T>::moStatistics;
+    using PartGatherer<T, T>::moValid;
+
     // Copies the valid values of a run to moValid, from nAt on, and returns their number; counts the others.
     std::size_t Sift(const T* pFrom, std::size_t n, unsigned int nStride, std::size_t nAt = 0)
     {
@@ -307,18 +357,13 @@ private:
             }
         }
     }
-
-    krv::gobs::SampleMatch<T> moNoData;
-    ChannelStatistics moCounts;
-    RunStatistics<T> moStatistics;
-    std::array<T, RUN> moValid;
 };
 
 template <typename T>
-class ComplexGatherer : public StatisticsGatherer
+class ComplexGatherer : public PartGatherer<T, double>
 {
 public:
-    explicit ComplexGatherer(const OptionalNoData& oNoData) : moNoData(oNoData) {}
+    using PartGatherer<T, double>::PartGatherer;
 
     void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride,
              const unsigned char* pValid) override
@@ -347,58 +392,60 @@ public:
         }
     }
 
-    ChannelStatistics Get() const override
-    {
-        ChannelStatistics oResult = moCounts;
-        moStatistics.Report(oResult);
-        return oResult;
-    }
-
 private:
+    using PartGatherer<T, double>::moNoData;
+    using PartGatherer<T, double>::moCounts;
+    using PartGatherer<T, double>::moStatistics;
+    using PartGatherer<T, double>::moValid;
+
     static double Magnitude(T nReal, T nImaginary)
     {
         const double nA = static_cast<double>(nReal), nB = static_cast<double>(nImaginary);
         return std::is_same_v<T, double> ? std::hypot(nA, nB) : std::sqrt(nA * nA + nB * nB);
     }
-
-    krv::gobs::SampleMatch<T> moNoData;
-    ChannelStatistics moCounts;
-    RunStatistics<double> moStatistics;
-    std::array<double, RUN> moValid;
 };
 
-// One result per channel of the reader. oNoData: one per channel. pValidity: set bits are valid pixels; null: all are.
-std::vector<ChannelStatistics> StatisticsOf(krv::datasources::IRasterReader& oReader,
-                                            const std::vector<OptionalNoData>& oNoData,
-                                            const krv::gobs::IMaskBuilder* pValidity, const Progress& oProgress)
+// What a thread needs: the channels of one type that are looked at, and what says which pixels are valid beside the
+// values of their own channels; null when nothing does.
+struct Worker
 {
-    const unsigned int nChannels = oReader.GetChansCount();
-    const auto nValueBytes = static_cast<std::size_t>(oReader.GetDataType().GetValueBits() / 8);
-    std::vector<std::unique_ptr<StatisticsGatherer>> oGatherers;
-    for (unsigned int c = 0; c < nChannels; ++c)
-        oGatherers.push_back(StatisticsGatherer::Make(oReader.GetDataType(), oNoData.at(c)));
-    ProgressCounter oCounter(
-        oProgress, "stats",
-        krv::gobs::BufferBytes(oReader.GetWidth(), oReader.GetHeight(), nChannels, oReader.GetDataType()));
-    oReader.SetMargins(0, 0, eMirror);
-    for (const std::unique_ptr<krv::gobs::Raster> poTile : krv::datasources::RasterRange(oReader))
-    {
-        const std::uint64_t nPixels = static_cast<std::uint64_t>(poTile->GetWidth()) * poTile->GetHeight();
-        const std::unique_ptr<const krv::gobs::Mask> poMask(pValidity != nullptr ? pValidity->BuildMask(*poTile)
-                                                                                 : nullptr);
-        const unsigned char* const pValid =
-            poMask != nullptr && poMask->CountSet() != nPixels ? poMask->GetBits() : nullptr;
-        for (unsigned int c = 0; c < nChannels; ++c)
-            oGatherers[c]->Add(poTile->GetBuffer() + c * nValueBytes, nPixels, nChannels, pValid);
-        oCounter.Advance(poTile->GetBufferSize());
-    }
-    std::vector<ChannelStatistics> oResults;
-    for (const auto& poGatherer : oGatherers)
-        oResults.push_back(poGatherer->Get());
-    return oResults;
+    FilePointer file;
+    LevelReader reader;
+    std::unique_ptr<ValiditySource> validity;
+};
+
+using Gatherers = std::vector<std::unique_ptr<StatisticsGatherer>>;
+
+Gatherers MakeGatherers(const krv::gobs::DataType& oType, const std::vector<OptionalNoData>& oNoData)
+{
+    Gatherers oGatherers;
+    for (const OptionalNoData& oValue : oNoData)
+        oGatherers.push_back(StatisticsGatherer::Make(oType, oValue));
+    return oGatherers;
 }
 
-// What says which pixels are valid beside the values of their own channels; null when nothing does.
+// Of one tile; oNoData: one per channel.
+struct TileStatistics
+{
+    Gatherers channels;
+    std::uint64_t bytes;
+};
+
+TileStatistics Gather(const Worker& oWorker, std::uint64_t nTile, const std::vector<OptionalNoData>& oNoData)
+{
+    const std::unique_ptr<krv::gobs::Raster> poTile(oWorker.reader.Get().GetRaster(static_cast<unsigned int>(nTile)));
+    const auto nValueBytes = static_cast<std::size_t>(poTile->GetDataType().GetValueBits() / 8);
+    const std::uint64_t nPixels = static_cast<std::uint64_t>(poTile->GetWidth()) * poTile->GetHeight();
+    const std::unique_ptr<const krv::gobs::Mask> poMask(
+        oWorker.validity != nullptr ? oWorker.validity->BuildMask(*poTile) : nullptr);
+    const unsigned char* const pValid =
+        poMask != nullptr && poMask->CountSet() != nPixels ? poMask->GetBits() : nullptr;
+    TileStatistics oResult{MakeGatherers(poTile->GetDataType(), oNoData), poTile->GetBufferSize()};
+    for (std::size_t c = 0; c < oNoData.size(); ++c)
+        oResult.channels[c]->Add(poTile->GetBuffer() + c * nValueBytes, nPixels, poTile->GetChansCount(), pValid);
+    return oResult;
+}
+
 std::unique_ptr<ValiditySource> FindValidity(const SourceFile& oFile, const std::vector<unsigned int>& oChannels)
 {
     const auto IsNone = [&oFile](unsigned int nChannel)
@@ -414,6 +461,49 @@ std::unique_ptr<ValiditySource> FindValidity(const SourceFile& oFile, const std:
     // A pixel without data in all channels that have a value is none in those that have not.
     const bool bPixels = poSource->HasNoData() && std::any_of(oChannels.begin(), oChannels.end(), IsNone);
     return poSource->HasBitmap() || poSource->HasAlpha() || bPixels ? std::move(poSource) : nullptr;
+}
+
+// One result per channel of a group, which are all of one type. Tiles are gathered each for itself and merged in their
+// order, so that sums of reals come out the same whoever gathers them.
+std::vector<ChannelStatistics> StatisticsOf(const SourceFile& oFile, const std::vector<unsigned int>& oChannels,
+                                            bool bRaw, const Progress& oProgress, krv::threading::IExecutor* poExecutor)
+{
+    std::vector<OptionalNoData> oNoData;
+    for (const unsigned int nChannel : oChannels)
+        oNoData.push_back(oFile.GetNoData(nChannel));
+    FileWorkers<Worker> oWorkers(oFile,
+                                 [&](FilePointer poFile)
+                                 {
+                                     LevelReader oReader = poFile->Read(oChannels);
+                                     oReader.Get().SetMargins(0, 0, eMirror);
+                                     auto poValidity = bRaw ? nullptr : FindValidity(*poFile, oChannels);
+                                     return std::make_unique<Worker>(std::move(poFile), std::move(oReader),
+                                                                     std::move(poValidity));
+                                 });
+    const LevelReader oWhole = oFile.Read(oChannels);
+    const krv::datasources::IRasterReader& oReader = oWhole.Get();
+    const Gatherers oTotal = MakeGatherers(oReader.GetDataType(), oNoData);
+    ProgressCounter oCounter(oProgress, "stats",
+                             krv::gobs::BufferBytes(oReader.GetWidth(), oReader.GetHeight(), oReader.GetChansCount(),
+                                                    oReader.GetDataType()));
+    krv::threading::TaskGroup oThreads(poExecutor, [&oCounter] { oCounter.Repeat(); });
+    krv::threading::ForEachItem(
+        oThreads, oReader.GetTileCount(),
+        [&](std::uint64_t nTile)
+        {
+            const typename FileWorkers<Worker>::Use oWorker(oWorkers);
+            return Gather(*oWorker, nTile, oNoData);
+        },
+        [&](const TileStatistics& oTile)
+        {
+            for (std::size_t c = 0; c < oTotal.size(); ++c)
+                oTotal[c]->Merge(*oTile.channels[c]);
+            oCounter.Advance(oTile.bytes);
+        });
+    std::vector<ChannelStatistics> oResults;
+    for (const auto& poGatherer : oTotal)
+        oResults.push_back(poGatherer->Get());
+    return oResults;
 }
 
 } // namespace
@@ -433,7 +523,7 @@ std::unique_ptr<StatisticsGatherer> StatisticsGatherer::Make(const krv::gobs::Da
 }
 
 std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile, const StatisticsRequest& oRequest,
-                                                 const Progress& oProgress)
+                                                 const Progress& oProgress, krv::threading::IExecutor* poExecutor)
 {
     const auto oChannels = oFile.CheckChannels(oRequest.channels);
     const unsigned int nAlpha = oRequest.raw ? 0 : krv::datasources::FindAlpha(oFile.GetMetadata());
@@ -450,12 +540,7 @@ std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile, const 
         }
         if (oGroup.channels.empty())
             continue;
-        const LevelReader oReader = oFile.Read(oGroup.channels);
-        std::vector<OptionalNoData> oNoData;
-        for (const unsigned int nChannel : oGroup.channels)
-            oNoData.push_back(oFile.GetNoData(nChannel));
-        const auto poValidity = oRequest.raw ? nullptr : FindValidity(oFile, oGroup.channels);
-        auto oFound = StatisticsOf(oReader.Get(), oNoData, poValidity.get(), oProgress);
+        auto oFound = StatisticsOf(oFile, oGroup.channels, oRequest.raw, oProgress, poExecutor);
         for (std::size_t i = 0; i < oFound.size(); ++i)
             oResults[oGroup.positions[i]] = std::move(oFound[i]);
     }

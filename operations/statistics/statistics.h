@@ -12,6 +12,11 @@
 #include <variant>
 #include <vector>
 
+namespace krv::threading
+{
+class IExecutor;
+}
+
 namespace krv::operations
 {
 
@@ -50,6 +55,9 @@ public:
     virtual void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride,
                      const unsigned char* pValid = nullptr) = 0;
     virtual ChannelStatistics Get() const = 0;
+    // Adds what another one, of the same type, has gathered. The result depends on the order, in the last digits of
+    // reals alone.
+    virtual void Merge(const StatisticsGatherer& oOther) = 0;
 
     // Throws DataException for a type outside the table.
     static std::unique_ptr<StatisticsGatherer> Make(const krv::gobs::DataType& oType, const OptionalNoData& oNoData);
@@ -62,8 +70,10 @@ struct StatisticsRequest
 };
 
 // One result for each channel that is asked for, in that order. Throws RequestException for a channel that is not
-// there.
-KRV_OPERATIONS_API std::vector<ChannelStatistics>
-ComputeStatistics(const SourceFile& oFile, const StatisticsRequest& oRequest, const Progress& oProgress = {});
+// there. The results are the same for any number of threads.
+KRV_OPERATIONS_API std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile,
+                                                                    const StatisticsRequest& oRequest,
+                                                                    const Progress& oProgress = {},
+                                                                    krv::threading::IExecutor* poExecutor = nullptr);
 
 } // namespace krv::operations

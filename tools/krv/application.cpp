@@ -3,12 +3,14 @@
 #include "toolkit/nspio/warning.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/interrupt.h"
+#include "tools/krv/threads.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
 
 #include <algorithm>
 #include <cstdio>
+#include <mutex>
 #include <string>
 #include <vector>
 
@@ -30,6 +32,8 @@ constexpr char FOOTER[] =
     "for this file; 1 it failed: a file, the disk, memory, an interrupt.\n"
     "Formats are found below the folder that KRVHOME names, else beside the library.";
 
+constexpr unsigned int MOST_THREADS = 1024;
+
 // Warnings that the library gave, each once. They are told at the end, except one that is the error itself.
 std::vector<std::string>& Warnings()
 {
@@ -37,8 +41,11 @@ std::vector<std::string>& Warnings()
     return oWarnings;
 }
 
+// Any thread warns; nobody reads before the work is done.
 void NoteWarning(const std::string& message, const std::string&, unsigned int)
 {
+    static std::mutex oMutex;
+    const std::lock_guard oLock(oMutex);
     auto& oWarnings = Warnings();
     if (!message.empty() && std::find(oWarnings.begin(), oWarnings.end(), message) == oWarnings.end())
         oWarnings.push_back(message);
@@ -95,8 +102,11 @@ int RunApplication(int nArguments, char** pArguments)
     CLI::App oApp("Reads and writes raster files of every format that has a plug-in.", "krv");
     Selection oSelection;
     bool bVerbose = false;
+    unsigned int nThreads = 0;
     oApp.set_version_flag("--version", "krv " KRV_VERSION);
     oApp.add_flag("--verbose", bVerbose, "Errors also name the function, source file and line");
+    oApp.add_option("--threads", nThreads, "How many threads work at one time; one for each processor by default")
+        ->check(CLI::Range(1U, MOST_THREADS));
     oApp.failure_message(
         [](const CLI::App*, const CLI::Error& oError)
         {
@@ -130,6 +140,7 @@ int RunApplication(int nArguments, char** pArguments)
     }
     krv::nspio::Warning::SetSink(&NoteWarning);
     WatchForInterrupt();
+    SetThreadCount(nThreads);
     return RunVerb(oSelection, bVerbose);
 }
 

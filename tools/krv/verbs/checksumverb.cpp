@@ -2,6 +2,7 @@
 #include "operations/source/sourcefile.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/progress.h"
+#include "tools/krv/threads.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -26,8 +27,8 @@ struct Options
 int RunChecksum(const std::string& file, const Options& oOptions)
 {
     const auto oChannels = ParseNumbers(oOptions.channels, "--channels");
-    const auto oSums =
-        operations::ComputeChecksums(operations::SourceFile(file), oChannels, oOptions.level, ShowProgress());
+    const auto oSums = operations::ComputeChecksums(operations::SourceFile(file), oChannels, oOptions.level,
+                                                    ShowProgress(), GetExecutor());
     Json oRows = Json::array();
     std::string text;
     for (const operations::ChannelChecksum& oSum : oSums.channels)

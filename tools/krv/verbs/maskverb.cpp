@@ -4,6 +4,7 @@
 #include "tools/krv/jsontext.h"
 #include "tools/krv/polygonarguments.h"
 #include "tools/krv/progress.h"
+#include "tools/krv/threads.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -84,7 +85,7 @@ MaskResult Make(const std::string& file, Options& oOptions)
     const SourceFile oFile(file, oOptions.request.IsWriting() ? eUpdate : eReadOnly);
     for (const std::string& text : oOptions.polygons)
         oOptions.request.polygons.push_back(ReadPolygons(text));
-    return MakeMask(oFile, oOptions.request, ShowProgress());
+    return MakeMask(oFile, oOptions.request, ShowProgress(), GetExecutor());
 }
 
 int RunMask(const std::string& file, Options& oOptions)

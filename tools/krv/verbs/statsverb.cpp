@@ -3,6 +3,7 @@
 #include "operations/statistics/statistics.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/progress.h"
+#include "tools/krv/threads.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -89,7 +90,7 @@ int RunStats(const std::string& file, const Options& oOptions)
     const operations::StatisticsRequest oRequest{ParseNumbers(oOptions.channels, "--channels"), oOptions.raw};
     const operations::SourceFile oFile(file);
     Json oRows = Json::array();
-    for (const auto& oStatistics : operations::ComputeStatistics(oFile, oRequest, ShowProgress()))
+    for (const auto& oStatistics : operations::ComputeStatistics(oFile, oRequest, ShowProgress(), GetExecutor()))
         oRows.push_back(StatisticsToJson(oStatistics));
     Print(oOptions.json ? ToText({{"file", file},
                                   {"width", oFile.GetRaster().GetWidth()},

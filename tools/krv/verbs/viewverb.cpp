@@ -3,6 +3,7 @@
 #include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/progress.h"
+#include "tools/krv/threads.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -71,7 +72,7 @@ int RunView(const std::string& file, Options& oOptions)
     if (std::filesystem::equivalent(file, oOptions.target, oNone))
         throw UsageError(oOptions.target + " is the file itself; name another for the quick look");
     const SourceFile oFile(file);
-    const QuickLook oLook = MakeQuickLook(oFile, oOptions.look, ShowProgress());
+    const QuickLook oLook = MakeQuickLook(oFile, oOptions.look, ShowProgress(), GetExecutor());
     WritePng(oLook.picture, oOptions.target);
     Print(
         fmt::format("{}: {} x {}, {}\n", oOptions.target, oLook.picture.width, oLook.picture.height, Describe(oLook)));
