@@ -1,8 +1,9 @@
-// Values of every type as every other: CopyData and Merger of any shape beside a conversion value by value.
+// Values of every type as every other: CopyData, Merger and Splitter of any shape beside a conversion value by value.
 #include "fuzz/support/choices.h"
 #include "tests/support/conversionmodel.h"
 #include "toolkit/raster/copydata.h"
 #include "toolkit/raster/merger.h"
+#include "toolkit/raster/splitter.h"
 
 #include <memory>
 
@@ -132,13 +133,70 @@ void TryMerge(Choices& oChoices)
     CheckBuffer(oTarget, oExpected, oTo, "merge to type " + std::to_string(eTo));
 }
 
+void TrySplit(Choices& oChoices)
+{
+    const auto eFrom = static_cast<BufferType>(oChoices.Below(15));
+    const Type oFrom(eFrom);
+    const std::size_t nPixels = ChoosePixels(oChoices);
+    const unsigned int nSourceChannels = 1 + oChoices.Below(8);
+    const Buffer oSource(nPixels * nSourceChannels * oFrom.Bytes(), oChoices.Below(16));
+    FillValues(oSource, oFrom, oChoices);
+    std::vector<SplitTarget> oTargets(1 + oChoices.Below(4));
+    std::vector<Buffer> oBuffers, oExpected;
+    std::vector<unsigned char*> oPointers;
+    std::vector<std::uint64_t> oCounts, oExpectedCounts;
+    for (SplitTarget& oTarget : oTargets)
+    {
+        oTarget.meType = static_cast<BufferType>(oChoices.Below(15));
+        const Type oTo(oTarget.meType);
+        const bool bInOrder = oChoices.OneIn(3);
+        oTarget.moChannels.resize(bInOrder ? nSourceChannels : oChoices.Below(6));
+        for (unsigned int i = 0; i < oTarget.moChannels.size(); ++i)
+            oTarget.moChannels[i] = bInOrder ? i : oChoices.Below(nSourceChannels);
+        const std::size_t nBytes = nPixels * oTarget.moChannels.size() * oTo.Bytes();
+        oBuffers.emplace_back(nBytes, oChoices.Below(16));
+        oExpected.emplace_back(nBytes, 0);
+        oPointers.push_back(oBuffers.back().Get());
+        const std::size_t nFirst = oExpectedCounts.size();
+        oExpectedCounts.resize(nFirst + oTarget.moChannels.size());
+        for (std::size_t i = 0; i < nPixels * oTarget.moChannels.size(); ++i)
+        {
+            const std::size_t nChannel = i % oTarget.moChannels.size();
+            const unsigned char* const pFrom =
+                oSource.Get() +
+                (i / oTarget.moChannels.size() * nSourceChannels + oTarget.moChannels[nChannel]) * oFrom.Bytes();
+            unsigned char* const pTo = oExpected.back().Get() + i * oTo.Bytes();
+            krv::test::ModelValue(pFrom, oFrom, pTo, oTo);
+            bool bChanged = false;
+            for (int nPart = 0; nPart < oFrom.mnParts; ++nPart)
+            {
+                const long double nWas = oFrom.mpoPart->Load(pFrom + nPart * oFrom.mpoPart->mnBytes);
+                const long double nIs = nPart < oTo.mnParts ? oTo.mpoPart->Load(pTo + nPart * oTo.mpoPart->mnBytes) : 0;
+                bChanged = bChanged || !(nWas == nIs || (std::isnan(nWas) && std::isnan(nIs)));
+            }
+            oExpectedCounts[nFirst + nChannel] += bChanged ? 1 : 0;
+        }
+    }
+    oCounts.resize(oExpectedCounts.size());
+    const bool bCount = !oChoices.OneIn(4);
+    Splitter(eFrom, nSourceChannels, oTargets)
+        .Run(oSource.Get(), oPointers, nPixels, bCount ? oCounts.data() : nullptr);
+    for (std::size_t i = 0; i < oTargets.size(); ++i)
+        CheckBuffer(oBuffers[i], oExpected[i], Type(oTargets[i].meType),
+                    "split of type " + std::to_string(eFrom) + " to " + std::to_string(oTargets[i].meType));
+    Check(!bCount || oCounts == oExpectedCounts, "changed values of type " + std::to_string(eFrom));
+}
+
 } // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* poBytes, std::size_t nBytes)
 {
     Choices oChoices(poBytes, nBytes);
-    if (oChoices.OneIn(2))
+    const unsigned int nKind = oChoices.Below(3);
+    if (nKind == 1)
         TryMerge(oChoices);
+    else if (nKind == 2)
+        TrySplit(oChoices);
     else
         TryCopy(oChoices);
     return 0;

@@ -1,12 +1,13 @@
-// Measures conversion and merging against memcpy of the result in the same run: results of 16 KiB (first-level cache),
-// 128 KiB (second), 2 MiB (third) and 96 MiB (memory).
-//     krv_bench_conversion [--only convert|merge|stride] [--match TEXT]
+// Measures conversion, merging and splitting against memcpy of the result in the same run: results of 16 KiB
+// (first-level cache), 128 KiB (second), 2 MiB (third) and 96 MiB (memory).
+//     krv_bench_conversion [--only convert|merge|split|stride] [--match TEXT]
 
 #include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "toolkit/core/hmalloc.h"
 #include "toolkit/raster/copydata.h"
 #include "toolkit/raster/merger.h"
+#include "toolkit/raster/splitter.h"
 
 #include <algorithm>
 #include <cstdint>
@@ -123,6 +124,43 @@ void MeasureMerging(const Merging& o, std::uint64_t nBytes)
     Measure(o.msName, nPixels * nPixelBytes, o.mnGoal, oWork, oTarget.get());
 }
 
+struct Splitting
+{
+    const char* msName;
+    BufferType meFrom;
+    unsigned int mnChannels;
+    std::vector<SplitTarget> moTargets;
+    bool mbCounted; // values that change
+    double mnGoal;
+};
+
+// Beside memcpy of the source, which is the larger side as a rule. The values are those of all types.
+void MeasureSplitting(const Splitting& o, std::uint64_t nBytes)
+{
+    const std::uint64_t nPixelBytes = BufferDataSize(o.meFrom, o.mnChannels);
+    const std::uint64_t nPixels = nBytes / nPixelBytes;
+    const Block oSource = MakeBlock(nBytes);
+    std::vector<unsigned char> oSmall(nPixels * o.mnChannels);
+    for (std::size_t n = 0; n < oSmall.size(); ++n)
+        oSmall[n] = static_cast<unsigned char>(n * 7);
+    CopyData(oSmall.data(), eBT_8U, 1, oSource.get(), o.meFrom, 1, oSmall.size());
+    std::vector<Block> oBlocks;
+    std::vector<unsigned char*> oTargets;
+    for (const SplitTarget& oTarget : o.moTargets)
+    {
+        oBlocks.push_back(MakeBlock(BufferDataSize(oTarget.meType, nPixels * oTarget.moChannels.size())));
+        oTargets.push_back(oBlocks.back().get());
+    }
+    Splitter oSplitter(o.meFrom, o.mnChannels, o.moTargets);
+    std::vector<std::uint64_t> oChanged(o.mnChannels);
+    const auto oWork = [&]
+    {
+        oSplitter.Run(oSource.get(), oTargets, nPixels, o.mbCounted ? oChanged.data() : nullptr);
+    };
+    const Block oTarget = MakeBlock(nBytes);
+    Measure(o.msName, nPixels * nPixelBytes, o.mnGoal, oWork, oTarget.get());
+}
+
 struct Strides
 {
     const char* msName;
@@ -176,6 +214,19 @@ const Merging MERGINGS[] = {
      0},
 };
 
+const Splitting SPLITTINGS[] = {
+    {"3 x 32R to {8U, 16U, 32R}", eBT_32R, 3, {{eBT_8U, {0}}, {eBT_16U, {1}}, {eBT_32R, {2}}}, false, 0.75},
+    {"the same, counted", eBT_32R, 3, {{eBT_8U, {0}}, {eBT_16U, {1}}, {eBT_32R, {2}}}, true, 0.75},
+    {"6 x 64R to {3 x 8U, 2 x 16S, 64R}, counted",
+     eBT_64R,
+     6,
+     {{eBT_8U, {0, 2, 4}}, {eBT_16S, {1, 3}}, {eBT_64R, {5}}},
+     true,
+     0.75},
+    {"4 x 16U to {3 x 8U, 16U}, counted", eBT_16U, 4, {{eBT_8U, {0, 1, 2}}, {eBT_16U, {3}}}, true, 0},
+    {"3 x 32S to {8U, 16S, 32S}, counted", eBT_32S, 3, {{eBT_8U, {0}}, {eBT_16S, {1}}, {eBT_32S, {2}}}, true, 0},
+};
+
 const Strides STRIDES[] = {
     {"one of 3 x 8U out", eBT_8U, 3, eBT_8U, 1, 1},       {"one of 3 x 8U in", eBT_8U, 1, eBT_8U, 3, 1},
     {"one of 4 x 16U out", eBT_16U, 4, eBT_16U, 1, 1},    {"one of 4 x 16U in", eBT_16U, 1, eBT_16U, 4, 1},
@@ -187,7 +238,7 @@ const Strides STRIDES[] = {
 
 int main(int nArguments, char** sArguments)
 {
-    const Arguments oArguments(nArguments, sArguments, "[--only convert|merge|stride] [--match TEXT]");
+    const Arguments oArguments(nArguments, sArguments, "[--only convert|merge|split|stride] [--match TEXT]");
     const std::string match = oArguments.GetOption("match");
     const auto oMeasureAll = [&](const char* sPart, const char* sTitle, const auto& oWorkloads, auto Work)
     {
@@ -201,5 +252,6 @@ int main(int nArguments, char** sArguments)
     };
     oMeasureAll("convert", "Packed conversion against memcpy of the result", CONVERSIONS, MeasureConversion);
     oMeasureAll("merge", "Merging against memcpy of the result", MERGINGS, MeasureMerging);
+    oMeasureAll("split", "Splitting against memcpy of the source", SPLITTINGS, MeasureSplitting);
     oMeasureAll("stride", "Strided conversion against memcpy of the values written", STRIDES, MeasureStrides);
 }

@@ -1,6 +1,7 @@
 #include "datasources/overviews/overviewbuilder.h"
 
 #include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/irasterdataset.h"
@@ -10,6 +11,7 @@
 #include "datasources/reader/idatasetaccess.h"
 #include "datasources/writer/ioverviewwriteraccessor.h"
 #include "datasources/writer/irasterwriter.h"
+#include "datasources/writer/multitypewriter.h"
 #include "gobs/resampling/levelreducer.h"
 #include "gobs/resampling/leveltarget.h"
 #include "gobs/resampling/nodatasamples.h"
@@ -17,7 +19,9 @@
 
 #include <algorithm>
 #include <bit>
+#include <map>
 #include <numeric>
+#include <utility>
 
 namespace krv::datasources
 {
@@ -374,6 +378,42 @@ std::vector<unsigned int> GetDefaultLevels(unsigned int nWidth, unsigned int nHe
     return oLevels;
 }
 
+namespace
+{
+
+// The channels of each type of a writer that has several: values are rounded, and kept apart from no-data, in their own
+// type. None for other writers.
+std::map<krv::gobs::DataType, std::vector<unsigned int>> FindTypes(const IRasterWriter& oWriter)
+{
+    std::map<krv::gobs::DataType, std::vector<unsigned int>> oTypes;
+    const auto* const poMixed = dynamic_cast<const MultiTypeWriter*>(&oWriter);
+    for (std::size_t n = 0; poMixed != nullptr && n < poMixed->GetChannels().size(); ++n)
+        oTypes[poMixed->GetChannelsInfo()[n]->GetDataType()].push_back(poMixed->GetChannels()[n]);
+    return oTypes;
+}
+
+bool BuildEachType(const MultiTypeWriter& oWriter, const std::vector<unsigned int>& oLevels, const std::string& method,
+                   OverviewOptions oOptions)
+{
+    const auto oTypes = FindTypes(oWriter);
+    const auto oProgress = std::move(oOptions.moProgress);
+    std::uint64_t nTypesDone = 0;
+    oOptions.moProgress = [&](std::uint64_t nDone, std::uint64_t nTotal)
+    {
+        return !oProgress || oProgress(nDone + nTypesDone * nTotal, nTotal * oTypes.size());
+    };
+    for (const auto& [oType, oChannels] : oTypes)
+    {
+        BasicWriter oOne(dynamic_cast<IRasterDataset*>(oWriter.GetDataset()), oChannels);
+        if (!BuildOverviews(oOne, oLevels, method, oOptions))
+            return false;
+        ++nTypesDone;
+    }
+    return true;
+}
+
+} // namespace
+
 bool BuildOverviews(IRasterWriter& oWriter, const std::vector<unsigned int>& oLevels, const std::string& method,
                     const OverviewOptions& oOptions)
 {
@@ -382,6 +422,8 @@ bool BuildOverviews(IRasterWriter& oWriter, const std::vector<unsigned int>& oLe
     if (std::unique_ptr<IOverviewWriterAccessor>(oWriter.GetOverviewWriterAccessor()) == nullptr)
         throw krv::DataException("Overviews are built of image channels at full size", oPlace);
     const std::vector<unsigned int> oFactors = CheckFactors(oLevels, oWriter, oPlace);
+    if (const auto oTypes = FindTypes(oWriter); oTypes.size() > 1)
+        return BuildEachType(static_cast<const MultiTypeWriter&>(oWriter), oFactors, method, oOptions);
     OverviewBuilder oBuilder(oWriter, eMethod, oOptions, oPlace);
     oBuilder.Prepare(oFactors);
     if (!oBuilder.Run())

@@ -38,9 +38,13 @@ public:
     void SetLevelValid(unsigned int nLevel, bool bValid) override;
     void SetResamplingName(const std::string& oName) override;
 
-private:
+protected:
+    // Throws DataException for a dataset without an overview facet.
     IOverviewManager& Manager(const krv::Place& oPlace) const;
+    IRasterDataset& GetRasterDataset() const { return *mpoRasterDataset; }
+    const std::vector<unsigned int>& GetChannels() const { return moChannels; }
 
+private:
     std::shared_ptr<IOverviewManager> mpoManager;
     IRasterDataset* mpoRasterDataset; // borrowed
     std::vector<unsigned int> moChannels;

@@ -47,10 +47,7 @@ BasicWriter::BasicWriter() = default;
 
 BasicWriter::BasicWriter(const std::string& fileName)
 {
-    const IRasterDataset& oRasterDataset =
-        UseFile(fileName, "Cannot open file for writing when it does not exist", Place::Current());
-    mpoChannels->SetChannels(detail::AllChannels(oRasterDataset));
-    OpenDatasetOrCleanup(false);
+    UseFile(fileName, Place::Current());
 }
 
 BasicWriter::BasicWriter(const std::string& fileName, const std::vector<unsigned int>& oChannels)
@@ -61,28 +58,12 @@ BasicWriter::BasicWriter(const std::string& fileName, const std::vector<unsigned
 BasicWriter::BasicWriter(const std::string& fileName, const std::vector<unsigned int>& oChannels,
                          const std::string& format, const std::string& options)
 {
-    const Place oPlace = Place::Current();
-    if (oChannels.empty())
-        throw krv::DataException("No channels in dataset: file=" + fileName, oPlace);
-    DatasetManager& oManager = *DatasetManager::GetInstance();
-    const bool bThere = krv::core::fileio::File(fileName).Exists();
-    IDataset& oDataset =
-        UseNamed(bThere ? oManager.Open(fileName, eUpdate) : oManager.NewDataset(fileName, format, options), fileName,
-                 oChannels, oPlace);
-    auto* const poNewFile = dynamic_cast<INewFileDataset*>(&oDataset);
-    if (!bThere && poNewFile != nullptr)
-        poNewFile->KeepExisting();
-    if (oDataset.Exists())
-        OpenDatasetOrCleanup(false);
+    UseFileOrNew(fileName, oChannels, format, options, Place::Current());
 }
 
 BasicWriter::BasicWriter(const std::string& fileName, const IChannelFilter& oFilter)
 {
-    // "Can not" and the other constructor's "Cannot" both stand, intended: callers tell the two by it.
-    const IRasterDataset& oRasterDataset =
-        UseFile(fileName, "Can not open file for writing when it does not exist", Place::Current());
-    mpoChannels->SetChannels(oFilter.Accept(oRasterDataset));
-    OpenDatasetOrCleanup(false);
+    UseFile(fileName, oFilter, Place::Current());
 }
 
 BasicWriter::BasicWriter(IBitmapDataset* poDataset, const std::vector<unsigned int>& oBitmaps)
@@ -130,8 +111,42 @@ IDataset& BasicWriter::UseNamed(IDataset* poDataset, const std::string& fileName
     return *poDataset;
 }
 
+void BasicWriter::UseFile(const std::string& fileName, const Place& oPlace)
+{
+    const IRasterDataset& oRasterDataset =
+        OpenFile(fileName, "Cannot open file for writing when it does not exist", oPlace);
+    mpoChannels->SetChannels(detail::AllChannels(oRasterDataset));
+    OpenDatasetOrCleanup(false);
+}
+
+void BasicWriter::UseFile(const std::string& fileName, const IChannelFilter& oFilter, const Place& oPlace)
+{
+    // "Can not" and the other form's "Cannot" both stand, intended: callers tell the two by it.
+    const IRasterDataset& oRasterDataset =
+        OpenFile(fileName, "Can not open file for writing when it does not exist", oPlace);
+    mpoChannels->SetChannels(oFilter.Accept(oRasterDataset));
+    OpenDatasetOrCleanup(false);
+}
+
+void BasicWriter::UseFileOrNew(const std::string& fileName, const std::vector<unsigned int>& oChannels,
+                               const std::string& format, const std::string& options, const Place& oPlace)
+{
+    if (oChannels.empty())
+        throw krv::DataException("No channels in dataset: file=" + fileName, oPlace);
+    DatasetManager& oManager = *DatasetManager::GetInstance();
+    const bool bThere = krv::core::fileio::File(fileName).Exists();
+    IDataset& oDataset =
+        UseNamed(bThere ? oManager.Open(fileName, eUpdate) : oManager.NewDataset(fileName, format, options), fileName,
+                 oChannels, oPlace);
+    auto* const poNewFile = dynamic_cast<INewFileDataset*>(&oDataset);
+    if (!bThere && poNewFile != nullptr)
+        poNewFile->KeepExisting();
+    if (oDataset.Exists())
+        OpenDatasetOrCleanup(false);
+}
+
 // Opens a file whose image must be there already, and owns it from then on.
-IRasterDataset& BasicWriter::UseFile(const std::string& fileName, const char* pMissing, const Place& oPlace)
+IRasterDataset& BasicWriter::OpenFile(const std::string& fileName, const char* pMissing, const Place& oPlace)
 {
     SetDataset(DatasetManager::GetInstance()->Open(fileName, eUpdate), {}, true);
     if (GetDataset() != nullptr && !GetDataset()->Exists())
@@ -187,7 +202,7 @@ void BasicWriter::OpenDataset(bool bBitmaps)
         if (oChannels.empty())
             oChannels = detail::AllChannels(oRasterDataset);
         Require(!oChannels.empty(), "No channels selected to write", oPlace);
-        oOpened = detail::OpenChannels(oRasterDataset, oChannels, nullptr, oPlace);
+        oOpened = MakeChannels(oRasterDataset, oChannels, oPlace); // virtual: a derived writer may open otherwise
     }
     Commit(std::move(oOpened));
     mpoChannels->SetChannels(std::move(oChannels));
@@ -296,8 +311,19 @@ void BasicWriter::CreateNewFile(const krv::gobs::RasterInfo& oInfo)
             "The RasterInfo does not match the write channels of this writer", oPlace);
     if (oChannels.empty())
         mpoChannels->SetChannels(detail::FirstChannels(oInfo.GetChansCount()));
-    oRasterDataset.Create(oInfo);
+    LayOut(oRasterDataset, oInfo, oPlace);
     OpenDataset(false);
+}
+
+detail::OpenedChannels BasicWriter::MakeChannels(IRasterDataset& oDataset, const std::vector<unsigned int>& oChannels,
+                                                 const Place& oPlace)
+{
+    return detail::OpenChannels(oDataset, oChannels, nullptr, oPlace);
+}
+
+void BasicWriter::LayOut(IRasterDataset& oDataset, const krv::gobs::RasterInfo& oInfo, const Place&)
+{
+    oDataset.Create(oInfo);
 }
 
 void BasicWriter::SetAuxiliaryData(const AuxiliaryData& oData)

@@ -73,16 +73,31 @@ protected:
     // Opens a file for update; the caller owns the result, which is null when the file holds no image.
     static IRasterDataset* RDSIf(const std::string& fileName);
 
+    // How the public constructors take a dataset; derived writers call them in constructors of their own.
     // Takes a dataset over, and the channels of its file. Throws DataException for null and for one without rasters.
     IDataset& UseNamed(IDataset* poDataset, const std::string& fileName, const std::vector<unsigned int>& oChannels,
                        const krv::Place& oPlace);
-
-private:
-    void LazyOpen();
-    void OpenForWriting();
-    IRasterDataset& UseFile(const std::string& fileName, const char* pMissing, const krv::Place& oPlace);
+    // All channels of a file whose image must be there already, or those that a filter accepts.
+    void UseFile(const std::string& fileName, const krv::Place& oPlace);
+    void UseFile(const std::string& fileName, const IChannelFilter& oFilter, const krv::Place& oPlace);
+    // An existing file or a new one in a format.
+    void UseFileOrNew(const std::string& fileName, const std::vector<unsigned int>& oChannels,
+                      const std::string& format, const std::string& options, const krv::Place& oPlace);
     void UseRasterDataset(IRasterDataset* poDataset, const std::vector<unsigned int>& oChannels, bool bOwn,
                           const krv::Place& oPlace);
+
+    // Opens the selected channels unless they are open.
+    void LazyOpen();
+
+    // What a derived writer may do otherwise: how channels of an image are opened, and how that of a new file is laid
+    // out.
+    virtual detail::OpenedChannels MakeChannels(IRasterDataset& oDataset, const std::vector<unsigned int>& oChannels,
+                                                const krv::Place& oPlace);
+    virtual void LayOut(IRasterDataset& oDataset, const krv::gobs::RasterInfo& oInfo, const krv::Place& oPlace);
+
+private:
+    void OpenForWriting();
+    IRasterDataset& OpenFile(const std::string& fileName, const char* pMissing, const krv::Place& oPlace);
 };
 
 } // namespace krv::datasources

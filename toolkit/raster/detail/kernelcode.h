@@ -66,6 +66,64 @@ void Convert(const unsigned char* pSource, unsigned char* pTarget, std::size_t n
     }
 }
 
+// Exact for all pairs, and free of conversions that are undefined: where a value may have come out as the first whole
+// number above its type, or was beyond the other type's last one, that is asked for too.
+template <typename TSource, typename TTarget>
+[[gnu::always_inline]] inline bool IsChanged(TSource nFrom, TTarget nTo)
+{
+    if constexpr (std::is_integral_v<TSource> && std::is_integral_v<TTarget>)
+        return ConvertValue<TSource>(nTo) != nFrom;
+    else if constexpr (std::is_integral_v<TSource> && sizeof(TSource) <= 4)
+        return static_cast<double>(nFrom) != static_cast<double>(nTo);
+    else if constexpr (std::is_integral_v<TSource>)
+    {
+        constexpr TTarget END = static_cast<TTarget>(std::numeric_limits<TSource>::max() / 2 + 1) * 2;
+        return static_cast<TSource>(nTo < END ? nTo : TTarget(0)) != nFrom;
+    }
+    else if constexpr (std::is_integral_v<TTarget>)
+    {
+        constexpr TSource END = static_cast<TSource>(std::numeric_limits<TTarget>::max() / 2 + 1) * 2;
+        return !((nFrom == static_cast<TSource>(nTo)) & (nFrom < END));
+    }
+    else
+        return !((nFrom == static_cast<TSource>(nTo)) | ((nFrom != nFrom) & (nTo != nTo)));
+}
+
+template <std::size_t NSource, std::size_t NTarget>
+std::size_t CountChanges(const unsigned char* pSource, const unsigned char* pTarget, std::size_t nCount,
+                         std::size_t nStride)
+{
+    using TSource = std::tuple_element_t<NSource, PartTypes>;
+    using TTarget = std::tuple_element_t<NTarget, PartTypes>;
+    const auto Changed = [&](std::size_t nAt)
+    {
+        TSource nFrom;
+        TTarget nTo;
+        std::memcpy(&nFrom, pSource + nAt * sizeof(TSource), sizeof(TSource));
+        std::memcpy(&nTo, pTarget + nAt * sizeof(TTarget), sizeof(TTarget));
+        return IsChanged(nFrom, nTo);
+    };
+    std::size_t nChanged = 0;
+    if (nStride == 1)
+    {
+        // Counters as wide as the values.
+        constexpr std::size_t FEW = std::size_t{1} << 16;
+        using Counter = std::conditional_t<sizeof(TSource) == 8 || sizeof(TTarget) == 8, std::uint64_t, std::uint32_t>;
+        for (std::size_t nFirst = 0; nFirst < nCount; nFirst += FEW)
+        {
+            Counter nFew = 0;
+            const std::size_t nEnd = nCount - nFirst < FEW ? nCount : nFirst + FEW;
+            for (std::size_t i = nFirst; i < nEnd; ++i)
+                nFew += Changed(i) ? 1 : 0;
+            nChanged += nFew;
+        }
+        return nChanged;
+    }
+    for (std::size_t i = 0; i < nCount; ++i)
+        nChanged += Changed(i * nStride) ? 1 : 0;
+    return nChanged;
+}
+
 #ifdef __SSE4_1__
 
 // Whether a vector's values are converted as they are written; the pairs that mixed files meet in.
@@ -371,6 +429,7 @@ template <std::size_t... N>
 constexpr Kernels MakeKernels(std::index_sequence<N...>)
 {
     return {{Convert<N / PART_COUNT, N % PART_COUNT>...},
+            {CountChanges<N / PART_COUNT, N % PART_COUNT>...},
             {FindMerge<N / PART_COUNT, N % PART_COUNT>()...},
             VECTOR_BYTES,
             LOAD_BYTES};

@@ -17,6 +17,11 @@ inline constexpr std::array<std::size_t, PART_COUNT> PART_BYTES = {1, 1, 2, 2, 4
 // Packed values from one part type to another. Nothing need be aligned.
 using Converter = void (*)(const unsigned char* pSource, unsigned char* pTarget, std::size_t nCount);
 
+// How many of nCount values are not what they were converted from, NaN aside that is still NaN. Both lie nStride values
+// apart.
+using ChangeCounter = std::size_t (*)(const unsigned char* pSource, const unsigned char* pTarget, std::size_t nCount,
+                                      std::size_t nStride);
+
 // What one load gives to a vector; both are of the kernels' own length.
 struct MergeTerm
 {
@@ -37,6 +42,7 @@ struct Kernels
     using Pairs = std::array<TFunction, PART_COUNT * PART_COUNT>; // [source * PART_COUNT + target]
 
     Pairs<Converter> moConverters;
+    Pairs<ChangeCounter> moCounters;
     Pairs<MergeLoop> moMerges;     // null where values take a conversion of their own; without vectors everywhere
     std::size_t mnVectorBytes = 0; // of a merged vector
     std::size_t mnLoadBytes = 0;   // of the load of a term
@@ -44,6 +50,10 @@ struct Kernels
     Converter GetConverter(std::size_t nSource, std::size_t nTarget) const
     {
         return moConverters[nSource * PART_COUNT + nTarget];
+    }
+    ChangeCounter GetCounter(std::size_t nSource, std::size_t nTarget) const
+    {
+        return moCounters[nSource * PART_COUNT + nTarget];
     }
     MergeLoop GetMerge(std::size_t nSource, std::size_t nTarget) const
     {

@@ -1,0 +1,64 @@
+#pragma once
+
+#include "datasources/interfaces/windowedio.h"
+#include "datasources/writer/irasterwriter.h"
+#include "gobs/raster/datatype.h"
+#include "toolkit/raster/merger.h"
+#include "toolkit/raster/splitter.h"
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <vector>
+
+namespace krv::datasources::detail
+{
+
+// Channels of one type, which a writer of their own writes.
+struct WriterGroup
+{
+    std::unique_ptr<IRasterWriter> mpoWriter;
+    std::vector<unsigned int> moPositions; // of its channels in the raster, from 0
+};
+
+// How conversion changed samples; the writer's, which outlives its I/O.
+struct SampleChanges
+{
+    bool mbStrict = false;                // refuse them
+    std::vector<std::uint64_t> moCounts;  // of each channel
+    std::vector<unsigned int> moChannels; // their numbers in the file, for messages
+};
+
+// The transfer of windows of channels of several types as one type, over a writer for each type.
+class MultiTypeIO : public WindowedIO<IRasterIO>
+{
+public:
+    // The groups place every channel of the raster, each once; all are of one size.
+    MultiTypeIO(std::vector<WriterGroup> oGroups, const krv::gobs::DataType& oType,
+                std::shared_ptr<SampleChanges> poChanges);
+    ~MultiTypeIO() override;
+
+    unsigned int GetFileWidth() const override { return First().GetWidth(); }
+    unsigned int GetFileHeight() const override { return First().GetHeight(); }
+    unsigned int GetTileWidth() const override { return First().GetTileWidth(); }
+    unsigned int GetTileHeight() const override { return First().GetTileHeight(); }
+
+private:
+    class Parts;
+
+    const IRasterWriter& First() const { return *moGroups.front().mpoWriter; }
+    std::size_t GetPixelBytes() const override { return mnPixelBytes; }
+    void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) override;
+    void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) override;
+    void TakeChanges(const PixelRect& oRect, const std::vector<std::uint64_t>& oChanged);
+
+    std::vector<WriterGroup> moGroups; // ascending by data type
+    krv::gobs::DataType moType;
+    std::size_t mnPixelBytes = 0;
+    std::shared_ptr<SampleChanges> mpoChanges;
+    std::vector<unsigned int> moSplitPositions; // of the splitter's channels, in its order
+    std::optional<krv::raster::Splitter> moSplitter;
+    std::optional<krv::raster::Merger> moMerger; // made by the first reading
+};
+
+} // namespace krv::datasources::detail
