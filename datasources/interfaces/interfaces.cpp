@@ -10,6 +10,7 @@
 #include "datasources/interfaces/ifileiobuilder.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
+#include "datasources/interfaces/ilutdataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/interfaces/ioverviewio.h"
@@ -19,6 +20,7 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/interfaces/istoragedataset.h"
+#include "datasources/interfaces/iverifieddataset.h"
 
 namespace krv::datasources
 {
@@ -33,6 +35,7 @@ IFileFormat::~IFileFormat() = default;
 IFileIOBuilder::~IFileIOBuilder() = default;
 IGeocodedDataset::~IGeocodedDataset() = default;
 IHistoryIO::~IHistoryIO() = default;
+ILUTDataset::~ILUTDataset() = default;
 IMathModelDataset::~IMathModelDataset() = default;
 INewFileDataset::~INewFileDataset() = default;
 IOverviewIO::~IOverviewIO() = default;
@@ -42,6 +45,7 @@ IPagedDataset::~IPagedDataset() = default;
 IRasterDataset::~IRasterDataset() = default;
 IRasterIO::~IRasterIO() = default;
 IStorageDataset::~IStorageDataset() = default;
+IVerifiedDataset::~IVerifiedDataset() = default;
 
 unsigned int FindValidityMask(const IBitmapDataset& oBitmaps)
 {
