@@ -11,6 +11,7 @@
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
 #include "datasources/interfaces/ilinkeddataset.h"
+#include "datasources/interfaces/ilutdataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/interfaces/ioverviewio.h"
@@ -20,6 +21,7 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/interfaces/istoragedataset.h"
+#include "datasources/interfaces/iverifieddataset.h"
 
 namespace krv::datasources
 {
@@ -36,6 +38,7 @@ IFileIOBuilder::~IFileIOBuilder() = default;
 IGeocodedDataset::~IGeocodedDataset() = default;
 IHistoryIO::~IHistoryIO() = default;
 ILinkedDataset::~ILinkedDataset() = default;
+ILUTDataset::~ILUTDataset() = default;
 IMathModelDataset::~IMathModelDataset() = default;
 INewFileDataset::~INewFileDataset() = default;
 IOverviewIO::~IOverviewIO() = default;
@@ -45,6 +48,7 @@ IPagedDataset::~IPagedDataset() = default;
 IRasterDataset::~IRasterDataset() = default;
 IRasterIO::~IRasterIO() = default;
 IStorageDataset::~IStorageDataset() = default;
+IVerifiedDataset::~IVerifiedDataset() = default;
 
 unsigned int FindValidityMask(const IBitmapDataset& oBitmaps)
 {

@@ -63,6 +63,26 @@ void CopyLevel(const AuxiliaryData& oFrom, AuxiliaryData& oTo, unsigned int nLev
         oTo.SetChanMetadataValue(key, oFrom.GetChanMetadataValue(key, nChannel), nChannel);
 }
 
+AuxiliaryData TakeChannels(const AuxiliaryData& oRecord, const std::vector<unsigned int>& oSources,
+                           const std::vector<unsigned int>& oLevels)
+{
+    AuxiliaryData oNew(static_cast<unsigned int>(oSources.size()));
+    oNew.SetFileMetadata(oRecord.GetFileMetadata());
+    for (unsigned int nChannel = 1; nChannel <= oSources.size(); ++nChannel)
+    {
+        const unsigned int nSource = oSources[nChannel - 1];
+        if (nSource != 0)
+        {
+            oNew.SetChanMetadata(oRecord.GetChanMetadata(nSource), nChannel);
+            oNew.SetChannelDescription(oRecord.GetChannelDescription(nSource), nChannel);
+            continue;
+        }
+        for (const unsigned int nLevel : oLevels)
+            SetLevelValid(oNew, nChannel, nLevel, false, {});
+    }
+    return oNew;
+}
+
 std::string GetLevelMethod(const AuxiliaryData& oBook, unsigned int nLevel)
 {
     const std::string state = oBook.GetChanMetadataValue(GetKey(nLevel), 1);

@@ -24,6 +24,10 @@ KRV_DATASOURCES_API bool SetLevelInvalid(AuxiliaryData& oBook, unsigned int nLev
 KRV_DATASOURCES_API void RemoveLevel(AuxiliaryData& oBook, unsigned int nLevel);
 // Puts what a book says of a level in the place of what another one does, for the channels that both have.
 KRV_DATASOURCES_API void CopyLevel(const AuxiliaryData& oFrom, AuxiliaryData& oTo, unsigned int nLevel);
+// The record of a file whose channels came or went: the tags and descriptions of those that they were, by number, 0 for
+// new ones, of which no level is valid. oLevels: that the file has.
+KRV_DATASOURCES_API AuxiliaryData TakeChannels(const AuxiliaryData& oRecord, const std::vector<unsigned int>& oSources,
+                                               const std::vector<unsigned int>& oLevels);
 // In capitals; empty when it is not known.
 KRV_DATASOURCES_API std::string GetLevelMethod(const AuxiliaryData& oBook, unsigned int nLevel);
 

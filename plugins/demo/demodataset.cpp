@@ -94,15 +94,15 @@ std::uint64_t DemoDataset::MakeRoom(unsigned int nLevel)
     return mpoFile->Append(support::PlainSource::CountBytes(MakeLayout(nLevel)));
 }
 
-std::unique_ptr<support::IBlockSource> DemoDataset::MakeLevelSource(unsigned int nLevel, std::uint64_t nPlace)
+std::shared_ptr<support::IBlockSource> DemoDataset::MakeLevelSource(unsigned int nLevel, std::uint64_t nPlace)
 {
     const auto BeforeWrite = [this, nLevel]
     {
         mpoFile->BeginChange();
         if (nLevel == 1)
-            ForgetLevels();
+            ForgetOldPixels();
     };
-    return std::make_unique<support::PlainSource>(mpoFile->GetFile(), nPlace, MakeLayout(nLevel),
+    return std::make_shared<support::PlainSource>(mpoFile->GetFile(), nPlace, MakeLayout(nLevel),
                                                   IsWritten() ? BeforeWrite : std::function<void()>());
 }
 

@@ -29,7 +29,7 @@ public:
 protected:
     void StoreRecord(const support::RecordText& oRecord) const override;
     std::uint64_t MakeRoom(unsigned int nLevel) override;
-    std::unique_ptr<support::IBlockSource> MakeLevelSource(unsigned int nLevel, std::uint64_t nPlace) override;
+    std::shared_ptr<support::IBlockSource> MakeLevelSource(unsigned int nLevel, std::uint64_t nPlace) override;
 
 private:
     void ReadHeader();

@@ -89,12 +89,12 @@ void Dataset::CheckWriting(const char* pWhat, const Place& oPlace) const
 }
 
 void Dataset::CheckCreate(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes,
-                          const Place& oPlace) const
+                          const Place& oPlace, bool bEmpty) const
 {
     CheckOpen(oPlace);
     if (!mpoWriter || HasImage())
         Refuse("an image exists already", oPlace);
-    if (nWidth == 0 || nHeight == 0 || nWidth > INT_MAX || nHeight > INT_MAX || oTypes.empty())
+    if (nWidth == 0 || nHeight == 0 || nWidth > INT_MAX || nHeight > INT_MAX || (oTypes.empty() && !bEmpty))
         Refuse("an image of " + std::to_string(nWidth) + " x " + std::to_string(nHeight) + " pixels and " +
                    std::to_string(oTypes.size()) + " channels cannot be laid out",
                oPlace);

@@ -78,9 +78,11 @@ protected:
     void Abandon() const noexcept;
     // Whether the file is new or changed.
     bool IsWritten() const { return mpoWriter != nullptr; }
-    // Throws DataException unless the image of a new file is to be laid out, and can be.
+    // Whether it lies under its own name.
+    bool IsNamed() const { return !mpoWriter || mpoWriter->IsNamed(); }
+    // Throws DataException unless the image of a new file is to be laid out, and can be. bEmpty: without channels too.
     void CheckCreate(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes,
-                     const Place& oPlace) const;
+                     const Place& oPlace, bool bEmpty = false) const;
     // Makes the source the dataset's image and bounds the cache: three rows of its blocks, at least 64 MiB, at most
     // 256.
     void SetImage(std::shared_ptr<IBlockSource> poSource);

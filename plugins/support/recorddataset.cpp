@@ -1,6 +1,7 @@
 #include "plugins/support/recorddataset.h"
 
 #include "datasources/metadata/levelbook.h"
+#include "datasources/metadata/pixelstatistics.h"
 
 #include <utility>
 
@@ -17,6 +18,7 @@ void RecordDataset::Change(RecordText oRecord) const
 {
     StoreRecord(oRecord);
     moRecord = std::move(oRecord);
+    mbForgotten = false;
 }
 
 krv::datasources::AuxiliaryData RecordDataset::ReadAuxiliaryData()
@@ -68,17 +70,30 @@ krv::datasources::IOverviewManager* RecordDataset::GetOverviewManager()
     return new OverviewManager(*this, *this);
 }
 
-void RecordDataset::ForgetLevels()
+void RecordDataset::TakeChannels(const std::vector<unsigned int>& oSources)
 {
-    if (moRecord.moLevels.empty())
-        return;
-    // On a copy: where the header has no room for it the pixels are refused, and so they are the next time.
+    std::vector<unsigned int> oLevels;
+    for (const auto& [nLevel, nPlace] : moRecord.moLevels)
+        oLevels.push_back(nLevel);
     RecordText oRecord = moRecord;
-    bool bNews = false;
+    oRecord.moTags = krv::datasources::TakeChannels(moRecord.moTags, oSources, oLevels);
+    Change(std::move(oRecord));
+}
+
+// On a copy: where the header has no room for it the pixels are refused, and so they are the next time. The record of a
+// file that has no name yet is that of the pixels to come.
+void RecordDataset::ForgetOldPixels()
+{
+    if (mbForgotten && (!IsNamed() || mbForgottenNamed))
+        return;
+    RecordText oRecord = moRecord;
+    bool bNews = IsNamed() && krv::datasources::DropStatistics(oRecord.moTags);
     for (const auto& [nLevel, nPlace] : moRecord.moLevels)
         bNews = krv::datasources::SetLevelInvalid(oRecord.moTags, nLevel) || bNews;
     if (bNews)
         Change(std::move(oRecord));
+    mbForgotten = true;
+    mbForgottenNamed = IsNamed();
 }
 
 std::vector<LevelStore::Level> RecordDataset::GetLevels() const

@@ -10,8 +10,9 @@
 namespace krv::plugins::support
 {
 
-// A dataset whose metadata, reference system, geocoding and directory of levels are one text: a format says where that
-// text is kept and where the pixels are. Levels can be made as long as the file is written.
+// A dataset whose metadata, reference system, geocoding and directory of levels are one record: a format says where
+// that is kept, as text or in another form, and where the pixels are. Levels can be made as long as the file is
+// written.
 class RecordDataset : public Dataset, public krv::datasources::IGeocodedDataset, private LevelStore
 {
 public:
@@ -29,15 +30,22 @@ protected:
 
     // What the file says when it is opened, or an empty one of so many channels as it has.
     void ShowRecord(RecordText oRecord);
-    // For the format to call before pixels of the image change: makes the levels outdated.
-    void ForgetLevels();
+    const RecordText& GetRecord() const { return moRecord; }
+    // Channels came or went: their tags, by the numbers of those that they were, 0 for new ones, whose levels are not
+    // valid.
+    void TakeChannels(const std::vector<unsigned int>& oSources);
+    // For the format to call before pixels of the image change: makes the levels outdated, and once the file has its
+    // name what is recorded of their values. Costs nothing when it did so already.
+    void ForgetOldPixels();
+    // A level is opened anew when it is wanted next.
+    void ForgetOpened() { moOpened.clear(); }
 
     // Makes a record the file's. Throws DataException when that cannot be, and changes nothing.
     virtual void StoreRecord(const RecordText& oRecord) const = 0;
     // Room for a level that is not there, by the number that will find it.
     virtual std::uint64_t MakeRoom(unsigned int nLevel) = 0;
     // The pixels of a level.
-    virtual std::unique_ptr<IBlockSource> MakeLevelSource(unsigned int nLevel, std::uint64_t nPlace) = 0;
+    virtual std::shared_ptr<IBlockSource> MakeLevelSource(unsigned int nLevel, std::uint64_t nPlace) = 0;
 
 private:
     std::vector<Level> GetLevels() const override;
@@ -50,6 +58,8 @@ private:
     void Change(RecordText oRecord) const;
 
     mutable RecordText moRecord;
+    mutable bool mbForgotten = false; // what was known of the pixels before the last change
+    bool mbForgottenNamed = false;    // while the file had its name
     krv::ogc::cs::GeocodingInfo moGeocoding;
     std::map<unsigned int, std::shared_ptr<BlockImage>> moOpened; // levels
 };

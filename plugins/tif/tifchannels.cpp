@@ -53,20 +53,14 @@ void TifDataset::ChangeChannels(const std::vector<unsigned int>& oSources, const
     const krv::datasources::AuxiliaryData oOld = ReadAuxiliaryData();
     krv::datasources::AuxiliaryData oBare(oOld.GetChannelCount());
     oBare.SetFileMetadata(oOld.GetFileMetadata());
-    krv::datasources::AuxiliaryData oNew(static_cast<unsigned int>(oSources.size()));
-    oNew.SetFileMetadata(oOld.GetFileMetadata());
-    for (unsigned int nAt = 0; nAt < oSources.size(); ++nAt)
-        if (oSources[nAt] != 0)
-        {
-            oNew.SetChanMetadata(oOld.GetChanMetadata(oSources[nAt]), nAt + 1);
-            oNew.SetChannelDescription(oOld.GetChannelDescription(oSources[nAt]), nAt + 1);
-        }
-        else
-            for (const PageLevel& oLevel : GetLevels(PixelUse::eImage))
-                SetLevelValid(oNew, nAt + 1, oLevel.mnLevel, false, {});
+    std::vector<unsigned int> oLevels;
     std::vector<std::uint64_t> oNumbers = {oEditor.GetPages().front()->mnNumber};
     for (const PageLevel& oLevel : GetLevels(PixelUse::eImage))
+    {
+        oLevels.push_back(oLevel.mnLevel);
         oNumbers.push_back(oLevel.moPage.mnOffset);
+    }
+    const krv::datasources::AuxiliaryData oNew = krv::datasources::TakeChannels(oOld, oSources, oLevels);
     std::shared_ptr<support::IBlockSource> poSource;
     Edit(
         [&]

@@ -1,6 +1,7 @@
 #include "plugins/support/codec/blockcodec.h"
 
 #include "plugins/support/codec/deflate.h"
+#include "plugins/support/codec/lz4.h"
 #include "plugins/support/codec/lzw.h"
 #include "plugins/support/codec/packbits.h"
 #include "plugins/support/codec/zstd.h"
@@ -33,6 +34,7 @@ std::unique_ptr<BlockEncoder> MakeLzw(std::optional<int>)
 
 constexpr BlockCodec CODECS[] = {
     {"DEFLATE", DeflateEncoder::MAXIMUM_LEVEL, &Make<DeflateDecoder>, &MakeWithLevel<DeflateEncoder>},
+    {"LZ4", Lz4Encoder::MAXIMUM_LEVEL, &Make<Lz4Decoder>, &MakeWithLevel<Lz4Encoder>},
     {"LZW", 0, &Make<LzwDecoder>, &MakeLzw},
     {"PACKBITS", 0, &Make<PackBitsDecoder>, nullptr},
     {"ZSTD", ZstdEncoder::MAXIMUM_LEVEL, &Make<ZstdDecoder>, &MakeWithLevel<ZstdEncoder>}};

@@ -101,6 +101,26 @@ Extent Space::Take(std::uint64_t nBytes, std::uint64_t nReserve, const Place& oP
     return {nOffset, nTaken, mnGeneration};
 }
 
+// Of those that fit the smallest, as ever.
+std::optional<Extent> Space::AllocateBefore(std::uint64_t nBytes, std::uint64_t nEnd)
+{
+    const std::uint64_t nTaken = nBytes + nBytes % 2;
+    for (auto oFit = moBySize.lower_bound({nTaken, 0}); oFit != moBySize.end(); ++oFit)
+    {
+        const auto [nSize, nOffset] = *oFit;
+        if (nOffset + nTaken > nEnd)
+            continue;
+        RemoveFree(moFree.find(nOffset));
+        if (nSize > nTaken)
+            AddFree(nOffset + nTaken, nSize - nTaken);
+        const Extent oExtent{nOffset, nTaken, mnGeneration};
+        if (mbOperation)
+            moTaken.push_back(oExtent);
+        return oExtent;
+    }
+    return std::nullopt;
+}
+
 void Space::Release(const Extent& oExtent, std::uint64_t nKept)
 {
     if (mbOperation)
@@ -155,6 +175,40 @@ std::uint64_t Space::CountUnused() const
     for (const GivenUp& oPiece : moGivenUp)
         nBytes += oPiece.moExtent.mnBytes;
     return nBytes;
+}
+
+std::uint64_t Space::CountFree(std::uint64_t nEnd) const
+{
+    std::uint64_t nBytes = 0;
+    for (const auto& [nOffset, nFree] : moFree)
+        if (nOffset < nEnd)
+            nBytes += std::min(nFree, nEnd - nOffset);
+    return nBytes;
+}
+
+std::uint64_t Space::FindUsedEnd() const
+{
+    std::map<std::uint64_t, std::uint64_t> oUnused(moFree); // offset, bytes
+    for (const GivenUp& oPiece : moGivenUp)
+        oUnused[oPiece.moExtent.mnOffset] = oPiece.moExtent.mnBytes;
+    std::uint64_t nEnd = mnEnd;
+    for (auto oPiece = oUnused.rbegin(); oPiece != oUnused.rend(); ++oPiece)
+    {
+        if (oPiece->first + oPiece->second < nEnd)
+            break;
+        nEnd = oPiece->first;
+    }
+    return nEnd;
+}
+
+std::uint64_t Space::CutEnd()
+{
+    if (!moFree.empty() && moFree.rbegin()->first + moFree.rbegin()->second == mnEnd)
+    {
+        mnEnd = moFree.rbegin()->first;
+        RemoveFree(std::prev(moFree.end()));
+    }
+    return mnEnd;
 }
 
 void Space::RemoveFree(std::map<std::uint64_t, std::uint64_t>::iterator oFree)

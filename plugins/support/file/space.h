@@ -47,6 +47,8 @@ public:
     // A piece of nBytes, at an even offset; a large one of whole pages, at the file's end, begins with one. nReserve:
     // bytes that must still fit in behind it. Throws IOException when the file would pass its limit.
     Extent Allocate(std::uint64_t nBytes, std::uint64_t nReserve = 0, const Place& oPlace = Place::Current());
+    // The same in free room before nEnd alone; no value when there is none.
+    std::optional<Extent> AllocateBefore(std::uint64_t nBytes, std::uint64_t nEnd);
     // The first part of a fresh piece stays in use when nKept is above 0.
     void Release(const Extent& oExtent, std::uint64_t nKept = 0);
 
@@ -69,6 +71,12 @@ public:
 
     // Bytes that are free or were given up.
     std::uint64_t CountUnused() const;
+    // Bytes before nEnd that may be taken.
+    std::uint64_t CountFree(std::uint64_t nEnd) const;
+    // Where the last piece ends that is in use.
+    std::uint64_t FindUsedEnd() const;
+    // What is free at the end is no longer part of the file, which ends where this says.
+    std::uint64_t CutEnd();
 
 private:
     struct GivenUp

@@ -115,8 +115,9 @@ BlockImage::BlockImage(std::shared_ptr<IBlockSource> poSource, std::shared_ptr<B
     : mpoSource(std::move(poSource)), moLayout(mpoSource->GetLayout()), mpoCache(std::move(poCache)),
       mbParts(mpoSource->ReadsParts())
 {
-    mbSmallBlocks = std::uint64_t{moLayout.GetBlockWidth()} * moLayout.GetBlockHeight() <=
-                    LARGEST_KEPT_PART / moLayout.GetPixelBytes(0);
+    mbSmallBlocks =
+        moLayout.GetPlaneCount() != 0 && std::uint64_t{moLayout.GetBlockWidth()} * moLayout.GetBlockHeight() <=
+                                             LARGEST_KEPT_PART / moLayout.GetPixelBytes(0);
     if (mbParts)
     {
         mpoRowCache = std::make_unique<BlockCache>(ROW_CACHE_BYTES);

@@ -30,8 +30,6 @@ ImageLayout::ImageLayout(unsigned int nWidth, unsigned int nHeight, unsigned int
     CheckSize(nBlockWidth, "block width", oPlace);
     CheckSize(nBlockHeight, "block height", oPlace);
     mnBlocksAcross = (nWidth - 1) / nBlockWidth + 1;
-    if (moPlanes.empty())
-        throw DataException("The image has no channels", oPlace);
     moFirstChannels.reserve(moPlanes.size() + 1);
     maPixelBytes.reserve(moPlanes.size());
     std::uint64_t nChannels = 0;

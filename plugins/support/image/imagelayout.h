@@ -38,7 +38,8 @@ struct ChannelPlace
 class ImageLayout
 {
 public:
-    // Throws DataException for a size of 0 or above 2^31 - 1, for no planes, and for a type outside the table.
+    // No planes: an image without channels. Throws DataException for a size of 0 or above 2^31 - 1, and for a type
+    // outside the table.
     ImageLayout(unsigned int nWidth, unsigned int nHeight, unsigned int nBlockWidth, unsigned int nBlockHeight,
                 std::vector<Plane> oPlanes, const Place& oPlace = Place::Current());
 

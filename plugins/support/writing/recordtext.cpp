@@ -128,7 +128,23 @@ std::unique_ptr<krv::ogc::cs::ICRS> RecordText::GetCRS() const
 
 void RecordText::SetCRS(const krv::ogc::cs::ICRS& oCRS)
 {
-    moOwn[CRS] = oCRS.GetWKT();
+    SetDefinition(oCRS.GetWKT());
+}
+
+std::string RecordText::GetDefinition() const
+{
+    const auto oFound = moOwn.find(CRS);
+    return oFound == moOwn.end() ? std::string() : oFound->second;
+}
+
+void RecordText::SetDefinition(const std::string& definition)
+{
+    moOwn[CRS] = definition;
+}
+
+bool RecordText::HasGeocoding() const
+{
+    return moOwn.contains(GEOCODING);
 }
 
 krv::ogc::cs::GeocodingInfo RecordText::GetGeocoding() const

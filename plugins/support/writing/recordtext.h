@@ -35,6 +35,10 @@ public:
     // Null when there is none. Throws DataException for a text that defines no system.
     std::unique_ptr<krv::ogc::cs::ICRS> GetCRS() const;
     void SetCRS(const krv::ogc::cs::ICRS& oCRS);
+    // Its definition as it is kept; empty when there is none.
+    std::string GetDefinition() const;
+    void SetDefinition(const std::string& definition);
+    bool HasGeocoding() const;
     // The identity when there is none.
     krv::ogc::cs::GeocodingInfo GetGeocoding() const;
     void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo);

@@ -12,7 +12,7 @@ using krv::test::Bytes;
 TEST(BlockCodec, BothDirectionsOfAnEntryAgree)
 {
     std::mt19937 oRandom(7);
-    for (const char* pName : {"DEFLATE", "LZW", "ZSTD"})
+    for (const char* pName : {"DEFLATE", "LZ4", "LZW", "ZSTD"})
     {
         const BlockCodec* const pCodec = FindBlockCodec(pName);
         ASSERT_TRUE(pCodec != nullptr && pCodec->mpMakeEncoder != nullptr) << pName;

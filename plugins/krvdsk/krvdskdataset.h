@@ -1,0 +1,126 @@
+#pragma once
+
+#include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/ihistoryio.h"
+#include "datasources/interfaces/ilutdataset.h"
+#include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/istoragedataset.h"
+#include "datasources/interfaces/iverifieddataset.h"
+#include "plugins/krvdsk/pixels/tilesource.h"
+#include "plugins/krvdsk/store/storewriter.h"
+#include "plugins/support/overviewmanager.h"
+#include "plugins/support/recorddataset.h"
+
+#include <functional>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+namespace krv::plugins::krvdsk
+{
+
+// A native file. Bitmaps, tables and whatever else stands beside the channels are segments with one range of numbers.
+// An operation that changes the structure changes the catalogue in memory, after all that may fail; the file follows
+// with Synchronize.
+class KrvdskDataset : public support::RecordDataset,
+                      public krv::datasources::IBitmapDataset,
+                      public krv::datasources::IPCTDataset,
+                      public krv::datasources::ILUTDataset,
+                      public krv::datasources::IStorageDataset,
+                      public krv::datasources::IVerifiedDataset
+{
+public:
+    // Throws krv::FileException kinds that name file and cause; nothing stays open then.
+    KrvdskDataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat);
+    // A file to be updated, or a new one, whose image Create lays out.
+    KrvdskDataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<StoreWriter> poWriter);
+    ~KrvdskDataset() override;
+
+    // No types: an image without channels.
+    void Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes) override;
+    using support::RecordDataset::Create;
+    // After both of these, I/O objects made before are of no more use.
+    void AddNewChannel(const krv::gobs::RasterInfo& oInfo) override;
+    void DeleteChannel(unsigned int nChannel) override;
+    krv::datasources::IHistoryIO* GetHistoryIO(unsigned int nChannel) override;
+    void Close() override;
+
+    std::vector<unsigned int> GetBitmapList() const override { return ListSegments(Segment::BITMAP); }
+    krv::datasources::IRasterIO* GetBitmapIO(const std::vector<unsigned int>& oBitmaps) override;
+    void DeleteBitmap(unsigned int nBitmap) override;
+    unsigned int CreateBitmap() override;
+    std::string GetBitmapDescription(unsigned int nBitmap) const override;
+    void SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription) override;
+    krv::datasources::MetadataMap GetBitmapMetadata(unsigned int nBitmap) const override;
+    void SetBitmapMetadata(unsigned int nBitmap, const krv::datasources::MetadataMap& oMetadata) override;
+    krv::datasources::IOverviewManager* GetBitmapOverviewManager() override;
+
+    std::vector<unsigned int> GetPCTList() const override { return ListSegments(Segment::PCT); }
+    krv::gobs::PCT* GetPCT(unsigned int nPCT) const override;
+    unsigned int GetPCTChannel(unsigned int nPCT) const override;
+    std::string GetPCTDescription(unsigned int nPCT) const override;
+    unsigned int CreatePCT(const krv::gobs::PCT& oTable, unsigned int nChannel) override;
+    void UpdatePCT(unsigned int nPCT, const krv::gobs::PCT& oTable) override;
+    void SetPCTDescription(unsigned int nPCT, const std::string& oDescription) override;
+    void DeletePCT(unsigned int nPCT) override;
+
+    std::vector<unsigned int> GetLUTList() const override { return ListSegments(Segment::LUT); }
+    krv::datasources::LookupTable GetLUT(unsigned int nLUT) const override;
+    unsigned int GetLUTChannel(unsigned int nLUT) const override;
+    std::string GetLUTDescription(unsigned int nLUT) const override;
+    unsigned int CreateLUT(const krv::datasources::LookupTable& oTable, unsigned int nChannel) override;
+    void UpdateLUT(unsigned int nLUT, const krv::datasources::LookupTable& oTable) override;
+    void SetLUTDescription(unsigned int nLUT, const std::string& oDescription) override;
+    void DeleteLUT(unsigned int nLUT) override;
+
+    std::optional<std::uint64_t> GetUnusedBytes() override;
+    std::vector<std::string> Verify(const Progress& oProgress) override;
+
+protected:
+    void StoreRecord(const support::RecordText& oRecord) const override;
+    std::uint64_t MakeRoom(unsigned int nLevel) override { return nLevel; }
+    std::shared_ptr<support::IBlockSource> MakeLevelSource(unsigned int nLevel, std::uint64_t nPlace) override;
+
+private:
+    class BitmapLevels;
+    class History;
+
+    const Catalogue& GetCatalogue() const { return mpoWriter ? mpoWriter->GetCatalogue() : moCatalogue; }
+    // Of a file that is changed; throws DataException for any other.
+    StoreWriter& GetWriter(const char* pWhat, const Place& oPlace) const;
+    void ShowFile();
+    void ShowImage();
+    std::shared_ptr<support::IBlockSource> MakeSource(std::vector<std::shared_ptr<Plane>> oPlanes, unsigned int nLevel,
+                                                      std::function<void()> oBeforeWrite) const;
+    void AddPlanes(Catalogue& oCatalogue, const std::vector<krv::gobs::DataType>& oTypes, const Place& oPlace) const;
+    void ChangeChannels(const std::vector<unsigned int>& oSources);
+    // Everything that the state names, but for its root.
+    void ForEachPiece(const std::function<void(const Entry& oEntry, const std::string& what)>& oAction,
+                      const TileTable::Complain& oComplain);
+    std::shared_ptr<support::BlockImage> OpenBitmap(unsigned int nBitmap, unsigned int nLevel);
+
+    // Segments. Those of a kind, ascending; one of them, or a DataException when there is none of that kind.
+    std::vector<unsigned int> ListSegments(const std::string& kind) const;
+    const Segment& GetSegment(const std::string& kind, unsigned int nNumber, const Place& oPlace) const;
+    Segment& EditSegment(const std::string& kind, unsigned int nNumber, const Place& oPlace);
+    unsigned int AddSegment(Segment oSegment, const Place& oPlace);
+    unsigned int AddSegment(const std::string& kind, std::vector<unsigned char> oBytes, unsigned int nChannel,
+                            const Place& oPlace);
+    std::vector<unsigned char> ReadSegment(const std::string& kind, unsigned int nNumber, const Place& oPlace) const;
+    void SetSegmentBytes(const std::string& kind, unsigned int nNumber, std::vector<unsigned char> oBytes,
+                         const Place& oPlace);
+    void DeleteSegment(const std::string& kind, unsigned int nNumber, const Place& oPlace);
+
+    std::shared_ptr<StoreWriter> mpoWriter; // null when the file is only read
+    std::shared_ptr<StoreFile> mpoStore;
+    Catalogue moCatalogue; // of a file that is only read
+    std::vector<std::vector<std::string>> moHistories;
+    std::map<unsigned int, std::unique_ptr<History>> moHistoryFacets;
+    std::shared_ptr<BitmapLevels> mpoBitmapLevels;
+    std::map<std::pair<unsigned int, unsigned int>, std::shared_ptr<support::BlockImage>> moBitmaps; // number, level
+};
+
+} // namespace krv::plugins::krvdsk

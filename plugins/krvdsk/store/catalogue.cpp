@@ -1,0 +1,427 @@
+#include "plugins/krvdsk/store/catalogue.h"
+
+#include "toolkit/exceptions/exceptions.h"
+
+#include <algorithm>
+#include <array>
+#include <climits>
+#include <set>
+#include <utility>
+
+namespace krv::plugins::krvdsk
+{
+
+namespace
+{
+
+constexpr const char* CODING_NAMES[] = {"NONE", "DEFLATE", "ZSTD", "LZ4", "LZW"};
+
+constexpr const char* IMAGE = "Imag";
+constexpr const char* PLANE = "Plan";
+constexpr const char* LEVELS = "Levl";
+constexpr const char* SEGMENT = "Segm";
+constexpr const char* PLACE = "Geoc";
+constexpr const char* REFERENCE = "Crs ";
+constexpr const char* RECORD = "Meta";
+
+void AddMap(BytesWriter& oWriter, const krv::datasources::MetadataMap& oMap)
+{
+    oWriter.AddNumber(oMap.size(), 4);
+    for (const auto& [key, value] : oMap)
+    {
+        oWriter.AddText(key);
+        oWriter.AddText(value);
+    }
+}
+
+krv::datasources::MetadataMap ReadMap(BytesReader& oReader)
+{
+    krv::datasources::MetadataMap oMap;
+    for (std::uint32_t nLeft = oReader.ReadCount(); nLeft > 0; --nLeft)
+    {
+        std::string key = oReader.ReadText();
+        oMap[std::move(key)] = oReader.ReadText();
+    }
+    return oMap;
+}
+
+void AddPlane(BytesWriter& oWriter, const Plane& oPlane)
+{
+    krv::gobs::NativeDataTypeCode eType = krv::gobs::eDT_BIT;
+    oPlane.moType.FindNativeCode(eType);
+    for (const unsigned int nByte :
+         {static_cast<unsigned int>(oPlane.meStorage), static_cast<unsigned int>(eType),
+          static_cast<unsigned int>(oPlane.meCoding), unsigned{oPlane.mnPredictor}, unsigned{oPlane.mnCodingLevel}})
+        oWriter.AddNumber(nByte, 1);
+    oWriter.AddNumber(oPlane.moThere.size(), 4);
+    for (const bool bThere : oPlane.moThere)
+        oWriter.AddNumber(bThere ? 1 : 0, 1);
+    oWriter.AddNumber(oPlane.moTables.size(), 4);
+    for (const auto& [nLevel, poTable] : oPlane.moTables)
+    {
+        oWriter.AddNumber(nLevel, 4);
+        oWriter.AddEntry(poTable->GetTop());
+    }
+}
+
+void AddNumbers(BytesWriter& oWriter, const std::vector<unsigned int>& oNumbers)
+{
+    oWriter.AddNumber(oNumbers.size(), 4);
+    for (const unsigned int nNumber : oNumbers)
+        oWriter.AddNumber(nNumber, 4);
+}
+
+std::vector<unsigned int> ReadLevels(BytesReader& oReader)
+{
+    std::vector<unsigned int> oLevels;
+    for (std::uint32_t nLeft = oReader.ReadCount(); nLeft > 0; --nLeft)
+    {
+        oLevels.push_back(oReader.ReadCount());
+        if (oLevels.back() < 2 || oLevels.back() > INT_MAX ||
+            (oLevels.size() > 1 && oLevels.back() <= oLevels[oLevels.size() - 2]))
+            oReader.Fail("its levels are not in order");
+    }
+    return oLevels;
+}
+
+} // namespace
+
+const char* GetCodingName(Coding eCoding)
+{
+    return CODING_NAMES[static_cast<std::size_t>(eCoding)];
+}
+
+unsigned int Plane::GetChannels() const
+{
+    return static_cast<unsigned int>(std::count(moThere.begin(), moThere.end(), true));
+}
+
+std::uint8_t Plane::GetUsualPredictor(const krv::gobs::DataType& oType)
+{
+    if (oType.IsComplex() || oType.GetBits() < 8)
+        return 1;
+    return oType.IsReal() ? 3 : 2;
+}
+
+bool Plane::CanPredict(std::uint8_t nPredictor, const krv::gobs::DataType& oType)
+{
+    if (nPredictor == 1)
+        return true;
+    const bool bWhole = !oType.IsComplex() && oType.GetBits() >= 8;
+    return bWhole && (nPredictor == 2 || (nPredictor == 3 && oType.IsReal()));
+}
+
+void Blob::Set(std::vector<unsigned char> oBytes)
+{
+    if (oBytes.size() > StoreFile::LARGEST_RECORD)
+        throw DataException("A record of " + std::to_string(oBytes.size()) + " bytes is larger than a native file " +
+                            "takes, which is " + std::to_string(StoreFile::LARGEST_RECORD) + " bytes");
+    moBytes = std::move(oBytes);
+    mbChanged = true;
+}
+
+std::vector<unsigned char> Blob::Get(const StoreFile& oStore, const std::string& what) const
+{
+    if (mbChanged || !moEntry.IsStored())
+        return moBytes;
+    return oStore.Read(moEntry, what);
+}
+
+std::uint64_t Catalogue::CountTiles(unsigned int nLevel) const
+{
+    const std::uint64_t nWidth = (mnWidth - 1) / nLevel + 1, nHeight = (mnHeight - 1) / nLevel + 1;
+    return ((nWidth - 1) / mnBlockWidth + 1) * ((nHeight - 1) / mnBlockHeight + 1);
+}
+
+unsigned int Catalogue::CountChannels() const
+{
+    unsigned int nChannels = 0;
+    for (const std::shared_ptr<Plane>& poPlane : moPlanes)
+        nChannels += poPlane->GetChannels();
+    return nChannels;
+}
+
+std::string Catalogue::FindObstacle(const Plane& oPlane) const
+{
+    const std::uint64_t nRowBits = std::min(mnBlockWidth, mnWidth) * oPlane.GetPixelBits();
+    const std::uint64_t nBytes = (nRowBits + 7) / 8 * std::min(mnBlockHeight, mnHeight);
+    if (nBytes > LARGEST_TILE)
+        return "a tile would be of " + std::to_string(nBytes) + " bytes, more than " + std::to_string(LARGEST_TILE);
+    if (CountTiles(1) > MOST_TILES)
+        return "there would be " + std::to_string(CountTiles(1)) + " tiles";
+    return {};
+}
+
+std::shared_ptr<TileTable> Catalogue::MakeTable(unsigned int nLevel) const
+{
+    return std::make_shared<TileTable>(CountTiles(nLevel), Entry(), std::string());
+}
+
+std::shared_ptr<Plane> Catalogue::MakePlane(const krv::gobs::DataType& oType, unsigned int nChannels,
+                                            const std::string& name, const Place& oPlace) const
+{
+    auto poPlane = std::make_shared<Plane>();
+    poPlane->moType = oType;
+    poPlane->meCoding = meCoding;
+    poPlane->mnCodingLevel = mnCodingLevel;
+    if (meCoding != Coding::eNone)
+        poPlane->mnPredictor = mnPredictor == 0 ? Plane::GetUsualPredictor(oType) : mnPredictor;
+    if (!Plane::CanPredict(poPlane->mnPredictor, oType))
+        throw DataException(name + ": predictor " + std::to_string(mnPredictor) + " does not go with the type " +
+                                oType.Describe(),
+                            oPlace);
+    poPlane->moThere.assign(nChannels, true);
+    const std::string obstacle = FindObstacle(*poPlane);
+    if (!obstacle.empty())
+        throw DataException(name + ": " + obstacle + "; choose other blocks (options BLOCKXSIZE, BLOCKYSIZE)", oPlace);
+    poPlane->moTables[1] = MakeTable(1);
+    for (const unsigned int nLevel : moLevels)
+        poPlane->moTables[nLevel] = MakeTable(nLevel);
+    return poPlane;
+}
+
+std::shared_ptr<Plane> Catalogue::MakeBitmapPlane() const
+{
+    auto poPlane = std::make_shared<Plane>();
+    poPlane->moType = krv::gobs::eDT_BIT;
+    poPlane->meCoding = meCoding;
+    poPlane->mnCodingLevel = mnCodingLevel;
+    poPlane->moThere.assign(1, true);
+    poPlane->moTables[1] = MakeTable(1);
+    for (const unsigned int nLevel : moBitmapLevels)
+        poPlane->moTables[nLevel] = MakeTable(nLevel);
+    return poPlane;
+}
+
+std::string Catalogue::DescribePlane(unsigned int nFirst, unsigned int nChannels)
+{
+    if (nChannels == 1)
+        return "channel " + std::to_string(nFirst);
+    return "channels " + std::to_string(nFirst) + " to " + std::to_string(nFirst + nChannels - 1);
+}
+
+void Catalogue::Describe() const
+{
+    const auto Name = [](const Plane& oPlane, const std::string& what)
+    {
+        for (const auto& [nLevel, poTable] : oPlane.moTables)
+            poTable->SetDescription(nLevel == 1 ? what : what + ", level " + std::to_string(nLevel));
+    };
+    unsigned int nFirst = 1;
+    for (const std::shared_ptr<Plane>& poPlane : moPlanes)
+    {
+        Name(*poPlane, DescribePlane(nFirst, poPlane->GetChannels()));
+        nFirst += poPlane->GetChannels();
+    }
+    for (const auto& [nNumber, oSegment] : moSegments)
+        if (oSegment.mpoPlane)
+            Name(*oSegment.mpoPlane, oSegment.Describe(nNumber));
+}
+
+std::vector<unsigned char> Catalogue::Write() const
+{
+    BytesWriter oAll;
+    const auto AddItem = [&oAll](const char* pName, const auto& oFill)
+    {
+        BytesWriter oItem;
+        oFill(oItem);
+        oAll.AddItem(pName, oItem.GetBytes());
+    };
+    AddItem(IMAGE,
+            [this](BytesWriter& oItem)
+            {
+                for (const unsigned int nNumber : {mnWidth, mnHeight, mnBlockWidth, mnBlockHeight, mnNextSegment})
+                    oItem.AddNumber(nNumber, 4);
+                for (const unsigned int nByte : {static_cast<unsigned int>(meCoding), unsigned{mnCodingLevel},
+                                                 unsigned{mnPredictor}, unsigned{mbSeparate}})
+                    oItem.AddNumber(nByte, 1);
+            });
+    AddItem(LEVELS,
+            [this](BytesWriter& oItem)
+            {
+                AddNumbers(oItem, moLevels);
+                AddNumbers(oItem, moBitmapLevels);
+            });
+    for (const std::shared_ptr<Plane>& poPlane : moPlanes)
+        AddItem(PLANE, [&poPlane](BytesWriter& oItem) { AddPlane(oItem, *poPlane); });
+    for (const auto& oPair : moSegments)
+        AddItem(SEGMENT,
+                [&oPair](BytesWriter& oItem)
+                {
+                    const auto& [nNumber, oSegment] = oPair;
+                    oItem.AddNumber(nNumber, 4);
+                    oItem.AddNumber(oSegment.mnChannel, 4);
+                    oItem.AddText(oSegment.moKind);
+                    oItem.AddText(oSegment.moDescription);
+                    AddMap(oItem, oSegment.moMetadata);
+                    if (oSegment.mpoPlane)
+                        AddPlane(oItem, *oSegment.mpoPlane);
+                    else
+                        oItem.AddEntry(oSegment.moBytes.moEntry);
+                });
+    if (mbPlaced)
+        AddItem(PLACE,
+                [this](BytesWriter& oItem)
+                {
+                    for (const double nTerm : moGeocoding.GetTerms())
+                        oItem.AddReal(nTerm);
+                });
+    if (!moCRS.empty())
+        AddItem(REFERENCE, [this](BytesWriter& oItem) { oItem.AddText(moCRS); });
+    if (moRecord.moEntry.IsStored())
+        AddItem(RECORD, [this](BytesWriter& oItem) { oItem.AddEntry(moRecord.moEntry); });
+    return std::move(oAll.GetBytes());
+}
+
+void Catalogue::ReadImage(BytesReader oItem)
+{
+    for (unsigned int* pNumber : {&mnWidth, &mnHeight, &mnBlockWidth, &mnBlockHeight, &mnNextSegment})
+        *pNumber = oItem.ReadCount();
+    const auto nCoding = static_cast<std::uint8_t>(oItem.ReadNumber(1));
+    mnCodingLevel = static_cast<std::uint8_t>(oItem.ReadNumber(1));
+    mnPredictor = static_cast<std::uint8_t>(oItem.ReadNumber(1));
+    mbSeparate = oItem.ReadNumber(1) != 0;
+    if (mnWidth - 1 >= INT_MAX || mnHeight - 1 >= INT_MAX || mnBlockWidth - 1 >= LARGEST_BLOCK_SIDE ||
+        mnBlockHeight - 1 >= LARGEST_BLOCK_SIDE || nCoding >= std::size(CODING_NAMES) || mnPredictor > 3)
+        oItem.Fail("an image of " + std::to_string(mnWidth) + " x " + std::to_string(mnHeight) +
+                   " pixels in tiles of " + std::to_string(mnBlockWidth) + " x " + std::to_string(mnBlockHeight) +
+                   " and coding " + std::to_string(nCoding) + " cannot be");
+    meCoding = static_cast<Coding>(nCoding);
+}
+
+std::shared_ptr<Plane> Catalogue::ReadPlane(BytesReader& oItem, bool bBitmap) const
+{
+    auto poPlane = std::make_shared<Plane>();
+    const std::uint64_t nStorage = oItem.ReadNumber(1), nType = oItem.ReadNumber(1), nCoding = oItem.ReadNumber(1);
+    poPlane->mnPredictor = static_cast<std::uint8_t>(oItem.ReadNumber(1));
+    poPlane->mnCodingLevel = static_cast<std::uint8_t>(oItem.ReadNumber(1));
+    if (nStorage > static_cast<std::uint64_t>(Storage::eTiles) || nType > krv::gobs::eDT_BIT ||
+        (nType == krv::gobs::eDT_BIT) != bBitmap || nCoding >= std::size(CODING_NAMES))
+        oItem.Fail("channels of storage " + std::to_string(nStorage) + ", type " + std::to_string(nType) +
+                   " and coding " + std::to_string(nCoding) + " cannot be");
+    poPlane->meStorage = static_cast<Storage>(nStorage);
+    poPlane->moType = static_cast<krv::gobs::NativeDataTypeCode>(nType);
+    poPlane->meCoding = static_cast<Coding>(nCoding);
+    if (!Plane::CanPredict(poPlane->mnPredictor, poPlane->moType))
+        oItem.Fail("predictor " + std::to_string(poPlane->mnPredictor) + " does not go with the type " +
+                   poPlane->moType.Describe());
+    for (const unsigned char nThere : oItem.ReadBytes(oItem.ReadCount()))
+        poPlane->moThere.push_back(nThere != 0);
+    if (poPlane->GetChannels() == 0 || (bBitmap && poPlane->moThere.size() != 1))
+        oItem.Fail("a plane has no channels, or too many");
+    std::vector<unsigned int> oLevels = bBitmap ? moBitmapLevels : moLevels;
+    oLevels.insert(oLevels.begin(), 1);
+    const std::uint32_t nTables = oItem.ReadCount();
+    for (std::uint32_t nTable = 0; nTable < nTables; ++nTable)
+    {
+        if (nTable >= oLevels.size() || oItem.ReadCount() != oLevels[nTable])
+            oItem.Fail("the levels of a plane are not those of the file");
+        const Entry oTop = oItem.ReadEntry();
+        poPlane->moTables[oLevels[nTable]] =
+            std::make_shared<TileTable>(CountTiles(oLevels[nTable]), oTop, std::string());
+    }
+    const std::string obstacle = FindObstacle(*poPlane);
+    if (nTables != oLevels.size() || !obstacle.empty())
+        oItem.Fail(obstacle.empty() ? "the levels of a plane are not those of the file" : obstacle);
+    return poPlane;
+}
+
+void Catalogue::ReadSegment(BytesReader oItem)
+{
+    const unsigned int nNumber = oItem.ReadCount();
+    Segment oSegment;
+    oSegment.mnChannel = oItem.ReadCount();
+    oSegment.moKind = oItem.ReadText();
+    oSegment.moDescription = oItem.ReadText();
+    oSegment.moMetadata = ReadMap(oItem);
+    if (oSegment.moKind == Segment::BITMAP)
+        oSegment.mpoPlane = ReadPlane(oItem, true);
+    else
+        oSegment.moBytes.moEntry = oItem.ReadEntry();
+    if (nNumber == 0 || nNumber >= mnNextSegment || oSegment.moKind.empty() ||
+        !moSegments.emplace(nNumber, std::move(oSegment)).second)
+        oItem.Fail("segment " + std::to_string(nNumber) + " is out of order");
+}
+
+Catalogue Catalogue::Read(const StoreFile& oStore, const std::vector<unsigned char>& oBytes)
+{
+    Catalogue oCatalogue;
+    BytesReader oAll(oBytes, oStore.GetName(), "the directory");
+    std::uint64_t nChannels = 0;
+    while (oAll.GetLeft() != 0)
+    {
+        std::string name;
+        BytesReader oItem = oAll.ReadItem(name);
+        if ((name == IMAGE) != (oCatalogue.mnWidth == 0))
+            oAll.Fail("it does not begin with the size of the image");
+        if (name == IMAGE)
+            oCatalogue.ReadImage(oItem);
+        else if (name == LEVELS)
+        {
+            oCatalogue.moLevels = ReadLevels(oItem);
+            oCatalogue.moBitmapLevels = ReadLevels(oItem);
+        }
+        else if (name == PLANE)
+        {
+            oCatalogue.moPlanes.push_back(oCatalogue.ReadPlane(oItem, false));
+            nChannels += oCatalogue.moPlanes.back()->GetChannels();
+        }
+        else if (name == SEGMENT)
+            oCatalogue.ReadSegment(oItem);
+        else if (name == PLACE)
+        {
+            std::array<double, 6> oTerms{};
+            for (double& nTerm : oTerms)
+                nTerm = oItem.ReadReal();
+            oCatalogue.moGeocoding = {oTerms[0], oTerms[1], oTerms[2], oTerms[3], oTerms[4], oTerms[5]};
+            oCatalogue.mbPlaced = oCatalogue.moGeocoding.IsInvertible();
+        }
+        else if (name == REFERENCE)
+            oCatalogue.moCRS = oItem.ReadText();
+        else if (name == RECORD)
+            oCatalogue.moRecord.moEntry = oItem.ReadEntry();
+        else if (name[0] >= 'A' && name[0] <= 'Z')
+            oAll.Fail("it holds an item \"" + name + "\", which this program does not know");
+    }
+    if (oCatalogue.mnWidth == 0 || nChannels > MOST_CHANNELS)
+        oAll.Fail("it names no image, or too many channels");
+    oCatalogue.Describe();
+    return oCatalogue;
+}
+
+TagRecord TagRecord::Read(const StoreFile& oStore, const std::vector<unsigned char>& oBytes, unsigned int nChannels)
+{
+    TagRecord oRecord(nChannels);
+    if (oBytes.empty())
+        return oRecord;
+    BytesReader oReader(oBytes, oStore.GetName(), "the record of metadata");
+    oRecord.moTags.SetFileMetadata(ReadMap(oReader));
+    if (oReader.ReadCount() != nChannels)
+        oReader.Fail("it is not that of " + std::to_string(nChannels) + " channels");
+    for (unsigned int nChannel = 1; nChannel <= nChannels; ++nChannel)
+    {
+        oRecord.moTags.SetChannelDescription(oReader.ReadText(), nChannel);
+        oRecord.moTags.SetChanMetadata(ReadMap(oReader), nChannel);
+        for (std::uint32_t nLeft = oReader.ReadCount(); nLeft > 0; --nLeft)
+            oRecord.moHistories[nChannel - 1].push_back(oReader.ReadText());
+    }
+    return oRecord;
+}
+
+std::vector<unsigned char> TagRecord::Write() const
+{
+    BytesWriter oWriter;
+    AddMap(oWriter, moTags.GetFileMetadata());
+    oWriter.AddNumber(moTags.GetChannelCount(), 4);
+    for (unsigned int nChannel = 1; nChannel <= moTags.GetChannelCount(); ++nChannel)
+    {
+        oWriter.AddText(moTags.GetChannelDescription(nChannel));
+        AddMap(oWriter, moTags.GetChanMetadata(nChannel));
+        oWriter.AddNumber(moHistories[nChannel - 1].size(), 4);
+        for (const std::string& entry : moHistories[nChannel - 1])
+            oWriter.AddText(entry);
+    }
+    return std::move(oWriter.GetBytes());
+}
+
+} // namespace krv::plugins::krvdsk
