@@ -239,7 +239,7 @@ MemoryDataset::MemoryDataset(const MemoryOptions& oOptions)
 MemoryDataset::MemoryDataset(const MemoryDataset& oOther) = default;
 MemoryDataset::~MemoryDataset() = default;
 
-std::unique_ptr<MemoryDataset> MemoryDataset::Share() const
+std::unique_ptr<IDataset> MemoryDataset::Share() const
 {
     CheckOpen();
     return std::make_unique<MemoryDataset>(*this);

@@ -42,7 +42,7 @@ public:
     ~MemoryDataset() override;
 
     // A new access to the same contents.
-    std::unique_ptr<MemoryDataset> Share() const;
+    std::unique_ptr<IDataset> Share() const;
     // The bytes of all pixels that there are.
     std::uint64_t GetBytes() const;
 

@@ -26,7 +26,8 @@ class IRasterDataset;
 enum eChannelPlacement
 {
     // Side by side from the first of their places, intended: stored processing chains count on it. Channels of the
-    // result that nothing is placed on are 0.
+    // result that nothing is placed on are 0. Levels have every channel at its own place, so of channels of 8U, 16U and
+    // 8U the image and its levels show different ones in place 3: who shows one for the other asks for eOwnPlace.
     eFromFirstPlace = 0,
     // Every channel at its own place.
     eOwnPlace = 1

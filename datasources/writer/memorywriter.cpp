@@ -22,7 +22,7 @@ MemoryDataset& MemoryWriter::Get() const
     return static_cast<MemoryDataset&>(*GetDataset());
 }
 
-std::unique_ptr<MemoryDataset> MemoryWriter::Share() const
+std::unique_ptr<IDataset> MemoryWriter::Share() const
 {
     return Get().Share();
 }

@@ -19,7 +19,7 @@ public:
     ~MemoryWriter() override;
 
     // What was and will be written, as a dataset of its own; it may outlive the writer.
-    std::unique_ptr<MemoryDataset> Share() const;
+    std::unique_ptr<IDataset> Share() const;
     // The bytes of all pixels that there are.
     std::uint64_t GetBytes() const;
 

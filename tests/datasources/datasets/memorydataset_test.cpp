@@ -212,7 +212,7 @@ TEST(MemoryDataset, WhatCannotBeIsRefused)
 TEST(MemoryWriter, HandsItsImageOnWithoutACopy)
 {
     const std::string pixels = RecipeImage(300, 200, {1, 2}, gobs::eDT_32R);
-    std::unique_ptr<MemoryDataset> oShared;
+    std::unique_ptr<IDataset> oShared;
     {
         MemoryWriter oWriter;
         EXPECT_FALSE(oWriter.FileExists());
@@ -235,7 +235,7 @@ TEST(MemoryWriter, HandsItsImageOnWithoutACopy)
         oWriter.SetAuxiliaryData(oTags);
         oShared = oWriter.Share();
         EXPECT_EQ(oWriter.GetBytes(), 300U * 200 * 8);
-        EXPECT_EQ(oShared->GetBytes(), 300U * 200 * 8);
+        EXPECT_EQ(dynamic_cast<MemoryDataset&>(*oShared).GetBytes(), 300U * 200 * 8);
     }
     IDataset& oDataset = *oShared;
     BasicReader oReader(&oDataset, {}, false);
@@ -245,7 +245,7 @@ TEST(MemoryWriter, HandsItsImageOnWithoutACopy)
     EXPECT_EQ(oReader.GetAuxiliaryData().GetChannelDescription(2), "second");
     EXPECT_EQ(oDataset.GetFileFormat(), nullptr);
     // An I/O object holds the contents by itself.
-    const std::unique_ptr<IRasterIO> oIO(oShared->GetRasterIO({1, 2}));
+    const std::unique_ptr<IRasterIO> oIO(dynamic_cast<datasources::IRasterDataset&>(*oShared).GetRasterIO({1, 2}));
     oShared.reset();
     std::string read(pixels.size(), '?');
     oIO->ReadWindow(0U, 0U, 300U, 200U, Bytes(read));
