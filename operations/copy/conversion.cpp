@@ -89,8 +89,7 @@ TableNumbers CopyTables(const CopyPlan& oPlan, const Target& oTarget)
     return oNumbers;
 }
 
-// Where the first file lies on the ground. The identity says nothing, unless a reference system stands beside it and no
-// control points do.
+// Where the first file lies on the ground.
 void CopyGeography(const CopyPlan& oPlan, const Target& oTarget)
 {
     const SourceFile& oSource = oPlan.GetSource(0);
@@ -101,7 +100,6 @@ void CopyGeography(const CopyPlan& oPlan, const Target& oTarget)
     const auto* const poFrom = dynamic_cast<IGeocodedDataset*>(&oSource.GetDataset());
     if (poFrom == nullptr)
         return;
-    const bool bPlaced = poCrs != nullptr && oSource.GetMetadata().GetFileMetadataValue("GroundControlPoints").empty();
     const krv::ogc::cs::GeocodingInfo& oInfo = poFrom->GetGeocoding();
     for (std::size_t s = 1; s < oPlan.GetSourceCount(); ++s)
     {
@@ -109,7 +107,7 @@ void CopyGeography(const CopyPlan& oPlan, const Target& oTarget)
         if (poOther != nullptr && !(poOther->GetGeocoding() == oInfo))
             Target::Warn(Of(oPlan, s, "it lies elsewhere than " + oSource.GetName() + ", whose place is taken"));
     }
-    if (oInfo.IsIdentity() && !bPlaced)
+    if (oInfo.IsIdentity() && !oSource.IsIdentityPlace(poCrs != nullptr))
         return;
     auto* const poTo = oTarget.Find<IGeocodedDataset>();
     if (poTo == nullptr)

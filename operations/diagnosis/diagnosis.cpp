@@ -1,6 +1,7 @@
 #include "operations/diagnosis/diagnosis.h"
 
 #include "datasources/formatregistrar/winformatregistrar.h"
+#include "datasources/interfaces/filekind.h"
 #include "datasources/interfaces/formatplugin.h"
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
@@ -28,7 +29,6 @@
 #include <fstream>
 #include <functional>
 #include <iterator>
-#include <string_view>
 
 namespace krv::operations
 {
@@ -202,56 +202,6 @@ void InstallationCheck::CheckManager()
     krv::nspio::Warning::SetSink(oFormerSink);
 }
 
-std::string GuessKind(const unsigned char* pHeader, std::size_t nBytes)
-{
-    struct Kind
-    {
-        std::size_t offset;
-        std::string_view signature;
-        const char* pName;
-    };
-    using namespace std::string_view_literals;
-    static constexpr Kind KINDS[] = {
-        {0, "II*\0"sv, "a TIFF file, little-endian"},
-        {0, "MM\0*"sv, "a TIFF file, big-endian"},
-        {0, "II+\0"sv, "a BigTIFF file, little-endian"},
-        {0, "MM\0+"sv, "a BigTIFF file, big-endian"},
-        {0, "\x89PNG\r\n\x1a\n"sv, "a PNG image"},
-        {0, "\xff\xd8\xff"sv, "a JPEG image"},
-        {4, "jP  "sv, "a JPEG 2000 image"},
-        {0, "\xff\x4f\xff\x51"sv, "a JPEG 2000 codestream"},
-        {0, "GIF8"sv, "a GIF image"},
-        {0, "BM"sv, "a BMP image"},
-        {0, "RIFF"sv, "a RIFF container, such as WebP"},
-        {0, "\x89HDF\r\n\x1a\n"sv, "an HDF5 or netCDF-4 file"},
-        {0, "\x0e\x03\x13\x01"sv, "an HDF4 file"},
-        {0, "CDF"sv, "a netCDF file"},
-        {0, "NITF"sv, "a NITF file"},
-        {0, "GRIB"sv, "a GRIB file"},
-        {0, "SIMPLE  ="sv, "a FITS file"},
-        {0, "ENVI"sv, "an ENVI header: name the data file beside it"},
-        {0, "PK\x03\x04"sv, "a ZIP archive: unpack it first"},
-        {0, "\x1f\x8b"sv, "gzip data: unpack it first"},
-        {0, "BZh"sv, "bzip2 data: unpack it first"},
-        {0,
-         "\xfd"
-         "7zXZ"sv,
-         "xz data: unpack it first"},
-        {0, "\x28\xb5\x2f\xfd"sv, "zstd data: unpack it first"},
-        {0, "%PDF"sv, "a PDF document"},
-        {0, "<?xml"sv, "an XML document"},
-        {0, "<!DOCTYPE html"sv, "a web page: was the download redirected?"},
-        {0, "<html"sv, "a web page: was the download redirected?"},
-        {0, "version https://git-lfs"sv, "a Git LFS pointer: fetch the real file with `git lfs pull`"}};
-    const std::string_view header(reinterpret_cast<const char*>(pHeader), nBytes);
-    for (const Kind& oKind : KINDS)
-    {
-        if (header.size() >= oKind.offset && header.substr(oKind.offset).starts_with(oKind.signature))
-            return oKind.pName;
-    }
-    return {};
-}
-
 namespace
 {
 
@@ -391,7 +341,7 @@ std::vector<Finding> CheckFile(const std::string& file, const std::vector<Loaded
         return {{false, "file " + file, why, {}}};
     Header oHeader{};
     const std::size_t nBytes = ReadHeader(file, oHeader);
-    const std::string kind = GuessKind(oHeader.data(), nBytes);
+    const std::string kind = GuessFileKind(oHeader.data(), nBytes);
     std::vector<Finding> oFindings{{true,
                                     "file " + file,
                                     fmt::format("{} bytes; begins like {}", std::filesystem::file_size(file),

@@ -59,7 +59,4 @@ private:
 // Why a file opens or does not: the file itself, which plug-ins were asked, what each said, and what its opening gave.
 KRV_OPERATIONS_API std::vector<Finding> CheckFile(const std::string& file, const std::vector<LoadedPlugin>& oPlugins);
 
-// What kind of file the first bytes say it is, such as "a PNG image"; empty when they say nothing.
-KRV_OPERATIONS_API std::string GuessKind(const unsigned char* pHeader, std::size_t nBytes);
-
 } // namespace krv::operations

@@ -62,13 +62,10 @@ ChannelFacts DescribeChannel(const SourceFile& oFile, unsigned int nChannel)
     return oFacts;
 }
 
-// The identity means that there is no geocoding, unless the file names a reference system: then the image lies in it by
-// that transform, or else by ground control points.
 std::optional<std::array<double, 6>> FindGeocoding(const SourceFile& oFile, bool bHasCrs)
 {
     const auto* const poGeocoded = dynamic_cast<IGeocodedDataset*>(&oFile.GetDataset());
-    const bool bPlaced = bHasCrs && oFile.GetMetadata().GetFileMetadataValue("GroundControlPoints").empty();
-    if (poGeocoded == nullptr || (poGeocoded->GetGeocoding().IsIdentity() && !bPlaced))
+    if (poGeocoded == nullptr || (poGeocoded->GetGeocoding().IsIdentity() && !oFile.IsIdentityPlace(bHasCrs)))
         return std::nullopt;
     return poGeocoded->GetGeocoding().GetTerms();
 }

@@ -149,6 +149,12 @@ krv::gobs::DataType SourceFile::GetType(unsigned int nChannel) const
     return poInfo->GetDataType();
 }
 
+bool SourceFile::IsIdentityPlace(bool bHasCrs) const
+{
+    return bHasCrs && moMetadata.GetFileMetadataValue("GroundControlPoints").empty() &&
+           moMetadata.GetFileMetadataValue("map info").empty();
+}
+
 std::string SourceFile::GetNoDataText(unsigned int nChannel) const
 {
     return nChannel <= moMetadata.GetChannelCount() ? krv::datasources::GetNoDataText(moMetadata, nChannel)

@@ -83,6 +83,9 @@ public:
     unsigned int GetChannelCount() const;
     krv::gobs::DataType GetType(unsigned int nChannel) const;
     const krv::datasources::AuxiliaryData& GetMetadata() const { return moMetadata; }
+    // Whether a geocoding that is the identity is a place: only beside a reference system, and where neither ground
+    // control points nor a rotated "map info" say another.
+    bool IsIdentityPlace(bool bHasCrs) const;
     // The channel's value of "NO_DATA_VALUE", else the file's, without white space around it; empty when there is none.
     std::string GetNoDataText(unsigned int nChannel) const;
     // The number in that text; a text that is none counts as no value, and a warning says so.

@@ -52,6 +52,7 @@ struct FormatTraits
     std::vector<const char*> moVariants; // options of new files
     bool mbMixedTypes;
     bool mbOverviews;
+    int mnFiles; // of one image
     // Files of other programs are read in tests/plugins.
     void MakeFile(const std::string& file, const Image& oImage) const
     {
@@ -85,7 +86,14 @@ private:
 };
 
 const FormatTraits FORMATS[] = {
-    {"DEMO", "demo", {""}, true, true},
+    {"DEMO", "demo", {""}, true, true, 1},
+    {"RAW",
+     "raw",
+     {"", "INTERLEAVE=BIL", "INTERLEAVE=BIP", "BYTEORDER=BIG", "INTERLEAVE=BIL BYTEORDER=BIG",
+      "INTERLEAVE=BIP BYTEORDER=BIG"},
+     false,
+     false,
+     2},
     {"TIF",
      "tif",
      {"TILED=NO BLOCKYSIZE=17", "BLOCKXSIZE=64 BLOCKYSIZE=48 INTERLEAVE=BAND",
@@ -95,14 +103,16 @@ const FormatTraits FORMATS[] = {
       "BLOCKXSIZE=64 BLOCKYSIZE=48 COMPRESS=LZW INTERLEAVE=BAND", "BLOCKXSIZE=64 BLOCKYSIZE=48 COMPRESS=ZSTD",
       "TILED=NO BLOCKYSIZE=17 COMPRESS=PACKBITS"},
      false,
-     true},
+     true,
+     1},
     {"KRVDSK",
      "krvdsk",
      {"", "BLOCKXSIZE=64 BLOCKYSIZE=48 INTERLEAVE=BAND", "BLOCKXSIZE=50 BLOCKYSIZE=70 COMPRESS=DEFLATE",
       "COMPRESS=ZSTD LEVEL=1 PREDICTOR=NO", "BLOCKXSIZE=64 BLOCKYSIZE=48 COMPRESS=LZ4",
       "BLOCKXSIZE=301 BLOCKYSIZE=7 COMPRESS=LZW INTERLEAVE=BAND"},
      true,
-     true}};
+     true,
+     1}};
 
 std::string Name(const ::testing::TestParamInfo<FormatTraits>& oInfo)
 {
@@ -227,7 +237,8 @@ TEST_P(FormatConformance, WritersTakeFreeNamesAndReplaceWhenTheyAreToldTo)
     EXPECT_TRUE(Holds(6)) << "the new one went, before it had the name";
     EXPECT_THROW(ReplacingWriter(file, {}, format, ""), krv::DataException);
     EXPECT_EQ(oCapture.moWarnings.size(), 2u);
-    EXPECT_EQ(std::distance(std::filesystem::directory_iterator(std::filesystem::path(file).parent_path()), {}), 1);
+    EXPECT_EQ(std::distance(std::filesystem::directory_iterator(std::filesystem::path(file).parent_path()), {}),
+              GetParam().mnFiles);
 }
 
 // Of many processes that make one file one gets its name, whichever, and the others are told.

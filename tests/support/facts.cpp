@@ -8,23 +8,6 @@
 namespace krv::test
 {
 
-namespace
-{
-
-std::vector<Facts> ReadFacts()
-{
-    std::vector<Facts> oRows;
-    std::ifstream oStream(DataFolder() + "/FACTS.tsv");
-    std::string line;
-    std::getline(oStream, line);
-    const auto oNames = Split(line, '\t');
-    while (std::getline(oStream, line))
-        oRows.emplace_back(oNames, Split(line, '\t'));
-    return oRows;
-}
-
-} // namespace
-
 std::string DataFolder()
 {
     const char* const pFolder = std::getenv("KRV_TEST_DATA");
@@ -38,6 +21,18 @@ std::vector<std::string> Split(const std::string& text, char nSeparator)
     for (std::string part; std::getline(oStream, part, nSeparator);)
         oParts.push_back(part);
     return oParts;
+}
+
+std::vector<Facts> ReadFacts(const std::string& table)
+{
+    std::vector<Facts> oRows;
+    std::ifstream oStream(DataFolder() + "/" + table);
+    std::string line;
+    std::getline(oStream, line);
+    const auto oNames = Split(line, '\t');
+    while (std::getline(oStream, line))
+        oRows.emplace_back(oNames, Split(line, '\t'));
+    return oRows;
 }
 
 Facts::Facts(const std::vector<std::string>& oNames, const std::vector<std::string>& oValues)
@@ -61,7 +56,7 @@ std::vector<double> Facts::Numbers(const std::string& name) const
 
 const std::vector<Facts>& GetFacts()
 {
-    static const std::vector<Facts> ROWS = ReadFacts();
+    static const std::vector<Facts> ROWS = ReadFacts("FACTS.tsv");
     return ROWS;
 }
 

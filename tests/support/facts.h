@@ -31,7 +31,8 @@ private:
     std::map<std::string, std::string> moValues;
 };
 
-// All rows; none when the folder is not there.
+// All rows of a table; none when the folder is not there. FACTS.tsv is of TIFF files, FACTS2.tsv of the other kinds.
+std::vector<Facts> ReadFacts(const std::string& table);
 const std::vector<Facts>& GetFacts();
 
 // IEEE half precision of a value that came from one.

@@ -253,6 +253,28 @@ const std::vector<std::pair<std::string, std::vector<std::string>>>& ForeignHead
     return HEADERS;
 }
 
+// A copy of the sample under another name without its ending, with the files that belong to it: those beside it that
+// begin with its name, or with its name up to the ending, and go on with a dot.
+std::string CopySample(const std::string& sample, const TempFolder& oFolder, const std::string& name)
+{
+    namespace fs = std::filesystem;
+    const fs::path oSample(sample);
+    const std::string full = oSample.filename().string(), stem = oSample.stem().string();
+    const std::string copy = name + oSample.extension().string();
+    const fs::path oBeside = oSample.has_parent_path() ? oSample.parent_path() : fs::path(".");
+    for (const auto& oEntry : fs::directory_iterator(oBeside))
+    {
+        const std::string other = oEntry.path().filename().string();
+        if (!oEntry.is_regular_file() || other == full)
+            continue;
+        if (other.starts_with(full + "."))
+            oFolder.Write(copy + other.substr(full.size()), ReadFile(oEntry.path().string()));
+        else if (other.starts_with(stem + "."))
+            oFolder.Write(name + other.substr(stem.size()), ReadFile(oEntry.path().string()));
+    }
+    return oFolder.Write(copy, ReadFile(sample));
+}
+
 std::string Padded(std::string header)
 {
     header.resize(HEADER_LENGTH, '\0');
@@ -272,7 +294,9 @@ void CheckIdentify(const Plugin& oPlugin, const std::string& sample, Findings& o
     const std::string otherName = "another." + (oExtensions.empty() ? "bin" : oExtensions[0]);
     for (int nTime = 0; nTime < 2; ++nTime)
         Expect(oFindings, Identify(oPlugin, sample, own) == 0, "the sample is not recognised, time ", nTime + 1);
-    Expect(oFindings, Identify(oPlugin, "renamed.xyz", own) == 0, "the sample is not recognised under another name");
+    const TempFolder oFolder;
+    Expect(oFindings, Identify(oPlugin, CopySample(sample, oFolder, "renamed.xyz"), own) == 0,
+           "the sample is not recognised under another name");
 
     for (const auto& [family, headers] : ForeignHeaders())
     {
@@ -373,7 +397,7 @@ void TryDamaged(const Plugin& oPlugin, const std::string& file, const std::strin
 void CheckTruncated(const Plugin& oPlugin, const std::string& sample, Findings& oFindings)
 {
     const TempFolder oFolder;
-    const std::string file = oFolder.Write("cut", ReadFile(sample));
+    const std::string file = CopySample(sample, oFolder, "cut");
     const std::size_t nDescriptors = CountDescriptors();
     for (std::uint64_t nBytes = std::filesystem::file_size(file); nBytes > 0;)
     {
@@ -388,7 +412,7 @@ void CheckDamaged(const Plugin& oPlugin, const std::string& sample, Findings& oF
 {
     const TempFolder oFolder;
     const std::string bytes = ReadFile(sample);
-    const std::string file = oFolder.Write("damaged", bytes);
+    const std::string file = CopySample(sample, oFolder, "damaged");
     const std::size_t nDescriptors = CountDescriptors();
     for (unsigned int nSeed = 0; nSeed < 400; ++nSeed)
     {
@@ -749,7 +773,7 @@ void CheckWrittenParts(IRasterDataset& oRaster, Findings& oFindings)
 void CheckWriting(const Plugin& oPlugin, const std::string& sample, Findings& oFindings)
 {
     const TempFolder oFolder;
-    const std::string copy = oFolder.Write(std::filesystem::path(sample).filename().string(), ReadFile(sample));
+    const std::string copy = CopySample(sample, oFolder, std::filesystem::path(sample).stem().string());
     DatasetPtr oDataset;
     if (!Throws([&] { oDataset.reset(oPlugin.GetBuilder().Open(copy, eUpdate)); }) && oDataset != nullptr)
         CheckWrittenParts(Raster(*oDataset), oFindings);

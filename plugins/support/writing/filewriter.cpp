@@ -46,8 +46,12 @@ void FileWriter::Synchronize()
     if (!HasFile())
         return;
     Store();
-    if (mbNamed)
-        return;
+    if (!mbNamed)
+        GiveName();
+}
+
+void FileWriter::GiveName()
+{
     mpoNew->TakeName(mbReplaces);
     SetNamed();
 }
