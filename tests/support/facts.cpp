@@ -11,10 +11,10 @@ namespace krv::test
 namespace
 {
 
-std::vector<Facts> ReadFacts()
+std::vector<Facts> ReadFacts(const std::string& table)
 {
     std::vector<Facts> oRows;
-    std::ifstream oStream(DataFolder() + "/FACTS.tsv");
+    std::ifstream oStream(DataFolder() + "/" + table);
     std::string line;
     std::getline(oStream, line);
     const auto oNames = Split(line, '\t');
@@ -59,10 +59,11 @@ std::vector<double> Facts::Numbers(const std::string& name) const
     return oNumbers;
 }
 
-const std::vector<Facts>& GetFacts()
+const std::vector<Facts>& GetFacts(const std::string& table)
 {
-    static const std::vector<Facts> ROWS = ReadFacts();
-    return ROWS;
+    static std::map<std::string, std::vector<Facts>> aTables;
+    const auto oFound = aTables.find(table);
+    return oFound != aTables.end() ? oFound->second : aTables[table] = ReadFacts(table);
 }
 
 std::uint16_t ToHalf(float nValue)

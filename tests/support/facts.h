@@ -31,8 +31,8 @@ private:
     std::map<std::string, std::string> moValues;
 };
 
-// All rows; none when the folder is not there.
-const std::vector<Facts>& GetFacts();
+// All rows of a table in the folder; none when it is not there.
+const std::vector<Facts>& GetFacts(const std::string& table = "FACTS.tsv");
 
 // IEEE half precision of a value that came from one.
 std::uint16_t ToHalf(float nValue);
