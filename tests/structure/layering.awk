@@ -32,6 +32,7 @@ BEGIN {
     home["^(proj\\.h|proj/)"] = "^toolkit/ogc/cs/";
     home["^(tiff|tiffio|geotiff|geo_|geokeys|geovalues|xtiffio)"] = "^(plugins/tif|tools/samplescene)/";
     home["^(libdeflate|zstd|lz4|lz4hc|zlib)\\.h"] = "^(plugins/support|plugins/tif|operations)/";
+    home["^openjpeg"] = "^plugins/jp2/";
     home["^(CLI|nlohmann)/"] = "^tools/";
     home["^fmt/"] = "^(operations|tools)/";
     home["^png\\.h"] = "^operations/";

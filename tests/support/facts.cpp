@@ -8,6 +8,23 @@
 namespace krv::test
 {
 
+namespace
+{
+
+std::vector<Facts> ReadFacts(const std::string& table)
+{
+    std::vector<Facts> oRows;
+    std::ifstream oStream(DataFolder() + "/" + table);
+    std::string line;
+    std::getline(oStream, line);
+    const auto oNames = Split(line, '\t');
+    while (std::getline(oStream, line))
+        oRows.emplace_back(oNames, Split(line, '\t'));
+    return oRows;
+}
+
+} // namespace
+
 std::string DataFolder()
 {
     const char* const pFolder = std::getenv("KRV_TEST_DATA");
@@ -21,18 +38,6 @@ std::vector<std::string> Split(const std::string& text, char nSeparator)
     for (std::string part; std::getline(oStream, part, nSeparator);)
         oParts.push_back(part);
     return oParts;
-}
-
-std::vector<Facts> ReadFacts(const std::string& table)
-{
-    std::vector<Facts> oRows;
-    std::ifstream oStream(DataFolder() + "/" + table);
-    std::string line;
-    std::getline(oStream, line);
-    const auto oNames = Split(line, '\t');
-    while (std::getline(oStream, line))
-        oRows.emplace_back(oNames, Split(line, '\t'));
-    return oRows;
 }
 
 Facts::Facts(const std::vector<std::string>& oNames, const std::vector<std::string>& oValues)
@@ -54,10 +59,11 @@ std::vector<double> Facts::Numbers(const std::string& name) const
     return oNumbers;
 }
 
-const std::vector<Facts>& GetFacts()
+const std::vector<Facts>& GetFacts(const std::string& table)
 {
-    static const std::vector<Facts> ROWS = ReadFacts("FACTS.tsv");
-    return ROWS;
+    static std::map<std::string, std::vector<Facts>> aTables;
+    const auto oFound = aTables.find(table);
+    return oFound != aTables.end() ? oFound->second : aTables[table] = ReadFacts(table);
 }
 
 std::uint16_t ToHalf(float nValue)

@@ -31,9 +31,8 @@ private:
     std::map<std::string, std::string> moValues;
 };
 
-// All rows of a table; none when the folder is not there. FACTS.tsv is of TIFF files, FACTS2.tsv of the other kinds.
-std::vector<Facts> ReadFacts(const std::string& table);
-const std::vector<Facts>& GetFacts();
+// All rows of a table in the folder; none when it is not there.
+const std::vector<Facts>& GetFacts(const std::string& table = "FACTS.tsv");
 
 // IEEE half precision of a value that came from one.
 std::uint16_t ToHalf(float nValue);

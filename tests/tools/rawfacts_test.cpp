@@ -155,7 +155,7 @@ void CompareStatistics(const Facts& oFacts, const std::string& file)
 
 TEST(RealRawFiles, AgreeWithTheTableOfFacts)
 {
-    const auto oRows = krv::test::ReadFacts("FACTS2.tsv");
+    const auto& oRows = krv::test::GetFacts("FACTS2.tsv");
     if (oRows.empty())
         GTEST_SKIP() << "no folder of real files";
     unsigned int nCompared = 0;
@@ -178,7 +178,7 @@ TEST(RealRawFiles, AgreeWithTheTableOfFacts)
 TEST(RealRawFiles, OthersAreRefusedWithTheirReason)
 {
     const std::string folder = krv::test::DataFolder() + "/";
-    if (krv::test::ReadFacts("FACTS2.tsv").empty())
+    if (krv::test::GetFacts("FACTS2.tsv").empty())
         GTEST_SKIP() << "no folder of real files";
     const std::pair<const char*, const char*> FILES[] = {
         {"raw/written/hand_short.dat", "is shorter than its header says: 15588 bytes in place of 15688"},
