@@ -9,6 +9,7 @@
 #include "datasources/writer/basicwriter.h"
 #include "gobs/pct/pct.h"
 #include "operations/copy/detail/copylevels.h"
+#include "operations/copy/detail/copymodels.h"
 #include "operations/copy/detail/copypixels.h"
 #include "operations/copy/detail/copyrecord.h"
 #include "operations/copy/detail/copyvalidity.h"
@@ -236,8 +237,10 @@ void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progres
         WriteValidity(oPlan, oTarget, 0);
     const TableNumbers oTables = CopyTables(oPlan, oTarget);
     CopyGeography(oPlan, oTarget);
-    const AuxiliaryData oRecord = MakeRecord(oPlan, oForm.name, oTables, bPixelsChange, bMask);
+    AuxiliaryData oRecord = MakeRecord(oPlan, oForm.name, oTables, bPixelsChange, bMask);
+    RecordModel(oPlan, oTarget, oRecord);
     oTarget.Try("the metadata", [&] { oTarget.Get().WriteAuxiliaryData(oRecord); });
+    CopyModels(oPlan, oTarget);
     if (oTarget.TakesBlocks())
         MoveBlocks(oPlan, oTarget, 1);
     else

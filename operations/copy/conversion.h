@@ -39,7 +39,7 @@ struct TargetForm
 };
 
 // Copies channels of one or several files of one size into a new file: pixels, metadata, geocoding, reference system,
-// colour tables, bitmaps and levels; with the option LAYOUT=COG levels are built when there are none. What the options
+// sensor models, colour tables, bitmaps and levels; with the option LAYOUT=COG levels are built when there are none. What the options
 // leave open stays as the first file has it: codec, predictor, blocks and interleaving; a whole image is copied block
 // by block as it is stored. Pixels are never encoded with loss unless the options ask for it, and then a mask says
 // which are valid. Warns of what the target's format cannot hold. A file of that name is replaced when the copy is

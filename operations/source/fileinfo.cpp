@@ -5,6 +5,7 @@
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
@@ -18,6 +19,7 @@
 #include "operations/job/exceptions.h"
 #include "operations/source/sourcefile.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/mathmodel/imathmodel.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 #include "toolkit/ogc/cs/icrs.h"
@@ -120,6 +122,13 @@ std::vector<ColourTableFacts> FindTables(const SourceFile& oFile)
     return oList;
 }
 
+MathModelFacts DescribeModel(IMathModelDataset& oModels, unsigned int nModel)
+{
+    const std::unique_ptr<krv::mathmodel::IMathModel> poModel(oModels.GetMathModel(nModel));
+    const double nAccuracy = poModel->GetAccuracy();
+    return {nModel, poModel->GetName(), nAccuracy < 0 ? std::nullopt : std::optional(nAccuracy)};
+}
+
 // A part that cannot be read is as if it were not there.
 template <typename Part>
 auto Attempt(const SourceFile& oFile, const char* pWhat, Part oPart)
@@ -135,6 +144,21 @@ auto Attempt(const SourceFile& oFile, const char* pWhat, Part oPart)
     }
 }
 
+// One that cannot be read is there all the same.
+std::vector<MathModelFacts> FindModels(const SourceFile& oFile)
+{
+    std::vector<MathModelFacts> oList;
+    auto* const poModels = dynamic_cast<IMathModelDataset*>(&oFile.GetDataset());
+    if (poModels == nullptr)
+        return oList;
+    for (const unsigned int nModel : poModels->GetMathModelList())
+    {
+        oList.push_back(Attempt(oFile, "a sensor model", [&] { return DescribeModel(*poModels, nModel); }));
+        oList.back().number = nModel;
+    }
+    return oList;
+}
+
 } // namespace
 
 FileInfo GatherInfo(const SourceFile& oFile)
@@ -143,7 +167,6 @@ FileInfo GatherInfo(const SourceFile& oFile)
     IDataset& oDataset = oFile.GetDataset();
     const AuxiliaryData& oMetadata = oFile.GetMetadata();
     const auto oGroups = oFile.GroupByType(oFile.CheckChannels({}));
-    const LevelReader oReader = oFile.Read(oGroups.front().channels);
 
     FileInfo oInfo;
     oInfo.file = oFile.GetName();
@@ -151,17 +174,22 @@ FileInfo GatherInfo(const SourceFile& oFile)
         oInfo.format = poFormat->GetShortName();
     oInfo.width = oRaster.GetWidth();
     oInfo.height = oRaster.GetHeight();
-    oInfo.blockWidth = oReader.Get().GetTileWidth();
-    oInfo.blockHeight = oReader.Get().GetTileHeight();
+    if (!oGroups.empty()) // a file may hold other things than channels
+    {
+        const LevelReader oReader = oFile.Read(oGroups.front().channels);
+        oInfo.blockWidth = oReader.Get().GetTileWidth();
+        oInfo.blockHeight = oReader.Get().GetTileHeight();
+        oInfo.overviews = Attempt(oFile, "the levels", [&] { return FindLevels(oReader.Get()); });
+    }
     for (unsigned int i = 1; i <= oRaster.GetChanCount(); ++i)
         oInfo.channels.push_back(DescribeChannel(oFile, i));
     oInfo.metadata = oMetadata.GetFileMetadata();
     oInfo.crs = Attempt(oFile, "the reference system", [&] { return FindCrs(oFile); });
     oInfo.geocoding = FindGeocoding(oFile, oInfo.crs.has_value());
-    oInfo.overviews = Attempt(oFile, "the levels", [&] { return FindLevels(oReader.Get()); });
     oInfo.bitmaps = Attempt(oFile, "the bitmaps", [&] { return FindBitmaps(oFile); });
-    if (const auto* const poModels = dynamic_cast<IMathModelDataset*>(&oDataset))
-        oInfo.mathModels = poModels->GetMathModelList();
+    oInfo.mathModels = FindModels(oFile);
+    if (const auto* const poLinked = dynamic_cast<ILinkedDataset*>(&oDataset))
+        oInfo.linkedFiles = poLinked->GetLinkedFiles();
     oInfo.colourTables = Attempt(oFile, "the colour tables", [&] { return FindTables(oFile); });
     oInfo.displayDefaults = {GetDefaultRed(oMetadata), GetDefaultGreen(oMetadata), GetDefaultBlue(oMetadata),
                              GetDefaultGrey(oMetadata)};

@@ -66,6 +66,13 @@ struct ColourTableFacts
     std::size_t entries = 0;
 };
 
+struct MathModelFacts
+{
+    unsigned int number = 0;
+    std::string kind;               // empty when the model cannot be read
+    std::optional<double> accuracy; // metres on the ground, as the provider states it
+};
+
 // Everything known of a file. What has no value is not there; empty texts and lists are.
 struct FileInfo
 {
@@ -81,7 +88,8 @@ struct FileInfo
     std::optional<std::array<double, 6>> geocoding;
     std::vector<LevelFacts> overviews;
     std::vector<BitmapFacts> bitmaps;
-    std::vector<unsigned int> mathModels;
+    std::vector<MathModelFacts> mathModels;
+    std::vector<std::string> linkedFiles; // those that hold the pixels
     std::vector<ColourTableFacts> colourTables;
     std::array<unsigned int, 4> displayDefaults{}; // red, green, blue, grey; 0: none
     std::optional<std::uint64_t> unusedBytes;

@@ -125,6 +125,7 @@ int RunApplication(int nArguments, char** pArguments)
     AddViewVerb(oApp, oSelection);
     AddWalkVerb(oApp, oSelection);
     AddConvertVerb(oApp, oSelection);
+    AddLinkVerb(oApp, oSelection);
     AddOverviewsVerb(oApp, oSelection);
     AddMaskVerb(oApp, oSelection);
     AddDoctorVerb(oApp, oSelection);

@@ -77,6 +77,19 @@ Json ToJson(const ColourTableFacts& oTable)
             {"entries", oTable.entries}};
 }
 
+Json ToJson(const MathModelFacts& oModel)
+{
+    return {{"number", oModel.number}, {"kind", TextOrNull(oModel.kind)}, {"accuracy", OrNull(oModel.accuracy)}};
+}
+
+Json NumbersToJson(const std::vector<MathModelFacts>& oModels)
+{
+    Json oList = Json::array();
+    for (const MathModelFacts& oModel : oModels)
+        oList.push_back(oModel.number);
+    return oList;
+}
+
 template <typename Facts>
 Json ListToJson(const std::vector<Facts>& oFacts)
 {
@@ -106,7 +119,7 @@ Json InfoToJson(const FileInfo& oInfo)
             {"crs", CrsToJson(oInfo.crs)},
             {"overviews", ListToJson(oInfo.overviews)},
             {"bitmaps", ListToJson(oInfo.bitmaps)},
-            {"mathModels", oInfo.mathModels},
+            {"mathModels", NumbersToJson(oInfo.mathModels)},
             {"colourTables", ListToJson(oInfo.colourTables)},
             {"displayDefaults",
              {{"red", NumberOrNull(oDisplay[0])},
@@ -114,7 +127,9 @@ Json InfoToJson(const FileInfo& oInfo)
               {"blue", NumberOrNull(oDisplay[2])},
               {"gray", NumberOrNull(oDisplay[3])}}},
             {"unusedBytes", OrNull(oInfo.unusedBytes)},
-            {"furtherImages", OrNull(oInfo.furtherImages)}};
+            {"furtherImages", OrNull(oInfo.furtherImages)},
+            {"models", ListToJson(oInfo.mathModels)},
+            {"linkedFiles", oInfo.linkedFiles}};
 }
 
 } // namespace krv::tool

@@ -96,6 +96,13 @@ std::string OverviewsText(const Json& oLevels)
     return text.empty() ? "" : Line("overviews", text);
 }
 
+std::string ModelText(const Json& oModel)
+{
+    const std::string accuracy = oModel["accuracy"].is_null() ? "" : ", accurate to " + Text(oModel["accuracy"]) + " m";
+    return Line("model", Text(oModel["number"]) + "  " +
+                             (oModel["kind"].is_null() ? "cannot be read" : Text(oModel["kind"]) + accuracy));
+}
+
 std::string DisplayText(const Json& oDisplay)
 {
     std::string text;
@@ -113,6 +120,8 @@ std::string InfoText(const Json& oInfo)
 {
     std::string text = Short(oInfo["file"].get<std::string>()) + "\n";
     text += Line("format", Text(oInfo["format"]));
+    for (const Json& oFile : oInfo["linkedFiles"])
+        text += Line("pixels in", Text(oFile));
     text += Line("size", fmt::format("{} x {} pixels, {} channel{}", Text(oInfo["width"]), Text(oInfo["height"]),
                                      oInfo["channels"].size(), oInfo["channels"].size() == 1 ? "" : "s"));
     text += Line("block", fmt::format("{} x {}", Text(oInfo["blockWidth"]), Text(oInfo["blockHeight"])));
@@ -126,8 +135,8 @@ std::string InfoText(const Json& oInfo)
     for (const Json& oTable : oInfo["colourTables"])
         text += Line("colours", fmt::format("table {} of channel {}, {} entries", Text(oTable["number"]),
                                             Text(oTable["channel"]), Text(oTable["entries"])));
-    if (!oInfo["mathModels"].empty())
-        text += Line("math models", oInfo["mathModels"].dump());
+    for (const Json& oModel : oInfo["models"])
+        text += ModelText(oModel);
     text += DisplayText(oInfo["displayDefaults"]);
     if (!oInfo["unusedBytes"].is_null() && oInfo["unusedBytes"] != 0)
         text += Line("unused", fmt::format("{} bytes of the file", Text(oInfo["unusedBytes"])));

@@ -4,6 +4,8 @@
 #include "datasources/metadata/pixelstatistics.h"
 #include "datasources/metadata/referencetag.h"
 #include "datasources/metadata/typednodata.h"
+#include "operations/copy/detail/copymodels.h"
+#include "toolkit/mathmodel/rpccoefficients.h"
 
 #include <fmt/format.h>
 
@@ -26,11 +28,7 @@ namespace
 
 constexpr char NO_DATA[] = "NO_DATA_VALUE";
 constexpr char CONTROL_POINTS[] = "GroundControlPoints";
-constexpr char POLYNOMIALS[] = "RPC";
 constexpr const char* TABLE_REFERENCES[] = {"DEFAULT_LUT_REF", "DEFAULT_PCT_REF"};
-// Of the polynomials' 92 numbers these two are the image position of their centre.
-constexpr std::size_t LINE_OFFSET = 2;
-constexpr std::size_t SAMPLE_OFFSET = 3;
 
 // Numbers separated by blanks; empty when anything else is among them.
 std::vector<double> ParseDoubles(const std::string& text)
@@ -70,22 +68,19 @@ std::string MovePoints(const std::string& text, const PixelWindow& oWindow)
     return moved;
 }
 
-std::string MovePolynomials(const std::string& text, const PixelWindow& oWindow)
-{
-    auto oNumbers = ParseDoubles(text);
-    Move(oNumbers, LINE_OFFSET, oWindow.y);
-    Move(oNumbers, SAMPLE_OFFSET, oWindow.x);
-    return fmt::format("{}", fmt::join(oNumbers, " "));
-}
-
 void MoveWithWindow(MetadataMap& oMap, const PixelWindow& oWindow)
 {
     const auto oPoints = oMap.find(CONTROL_POINTS);
     if (oPoints != oMap.end())
         oPoints->second = MovePoints(oPoints->second, oWindow);
     const auto oPolynomials = oMap.find(POLYNOMIALS);
-    if (oPolynomials != oMap.end())
-        oPolynomials->second = MovePolynomials(oPolynomials->second, oWindow);
+    if (oPolynomials == oMap.end())
+        return;
+    const auto oModel = krv::mathmodel::RpcCoefficients::FromText(oPolynomials->second);
+    if (oModel)
+        oPolynomials->second = oModel->Shifted(oWindow.x, oWindow.y).GetText();
+    else
+        oMap.erase(oPolynomials); // of what it is cannot be told whether it still holds
 }
 
 // The first file's channels by their place in the copy; places of others match no number.

@@ -27,6 +27,7 @@ void AddStatsVerb(CLI::App& oApp, Selection& oSelection);
 void AddViewVerb(CLI::App& oApp, Selection& oSelection);
 void AddWalkVerb(CLI::App& oApp, Selection& oSelection);
 void AddConvertVerb(CLI::App& oApp, Selection& oSelection);
+void AddLinkVerb(CLI::App& oApp, Selection& oSelection);
 void AddOverviewsVerb(CLI::App& oApp, Selection& oSelection);
 void AddMaskVerb(CLI::App& oApp, Selection& oSelection);
 void AddDoctorVerb(CLI::App& oApp, Selection& oSelection);
