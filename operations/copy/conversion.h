@@ -39,12 +39,12 @@ struct TargetForm
 };
 
 // Copies channels of one or several files of one size into a new file: pixels, metadata, geocoding, reference system,
-// sensor models, colour tables, bitmaps and levels; with the option LAYOUT=COG levels are built when there are none. What the options
-// leave open stays as the first file has it: codec, predictor, blocks and interleaving; a whole image is copied block
-// by block as it is stored. Pixels are never encoded with loss unless the options ask for it, and then a mask says
-// which are valid. Warns of what the target's format cannot hold. A file of that name is replaced when the copy is
-// complete; on a failure, and when the user stops it, nothing changes. Throws RequestException for what makes no sense,
-// DataException when the target is one of the sources or no plain file, and what formats throw.
+// sensor models, colour tables, bitmaps and levels; with the option LAYOUT=COG levels are built when there are none.
+// What the options leave open stays as the first file has it: codec, predictor, blocks and interleaving; a whole image
+// is copied block by block as it is stored. Pixels are never encoded with loss unless the options ask for it, and then
+// a mask says which are valid. Warns of what the target's format cannot hold. A file of that name is replaced when the
+// copy is complete; on a failure, and when the user stops it, nothing changes. Throws RequestException for what makes
+// no sense, DataException when the target is one of the sources or no plain file, and what formats throw.
 KRV_OPERATIONS_API void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress = {});
 
 } // namespace krv::operations
