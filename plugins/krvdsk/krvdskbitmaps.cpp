@@ -1,6 +1,8 @@
 // The bitmaps of a native file and their levels.
 #include "datasources/metadata/levelbook.h"
 #include "plugins/krvdsk/krvdskdataset.h"
+#include "plugins/krvdsk/link/linkedio.h"
+#include "plugins/krvdsk/link/linkedlevels.h"
 #include "plugins/support/image/rasterio.h"
 #include "plugins/support/image/stackedio.h"
 
@@ -31,14 +33,14 @@ public:
 
     unsigned int FindChannel(unsigned int nChannel) const override
     {
-        const std::vector<unsigned int> oList = moDataset.GetBitmapList();
+        const std::vector<unsigned int> oList = moDataset.ListSegments(Segment::BITMAP);
         const auto oFound = std::find(oList.begin(), oList.end(), nChannel);
         return oFound == oList.end() ? 0 : static_cast<unsigned int>(oFound - oList.begin()) + 1;
     }
 
     const krv::datasources::AuxiliaryData& GetBook() const override
     {
-        const std::vector<unsigned int> oList = moDataset.GetBitmapList();
+        const std::vector<unsigned int> oList = moDataset.ListSegments(Segment::BITMAP);
         moBook = krv::datasources::AuxiliaryData(static_cast<unsigned int>(oList.size()));
         for (unsigned int nAt = 0; nAt < oList.size(); ++nAt)
             moBook.SetChanMetadata(moDataset.GetCatalogue().moSegments.at(oList[nAt]).moMetadata, nAt + 1);
@@ -48,7 +50,7 @@ public:
     void MakeLevel(const Level& oLevel, const krv::datasources::AuxiliaryData& oBook, const Place&) override
     {
         Catalogue& oCatalogue = moDataset.mpoWriter->GetCatalogue();
-        for (const unsigned int nBitmap : moDataset.GetBitmapList())
+        for (const unsigned int nBitmap : moDataset.ListSegments(Segment::BITMAP))
             oCatalogue.moSegments.at(nBitmap).mpoPlane->moTables[oLevel.mnNumber] =
                 oCatalogue.MakeTable(oLevel.mnNumber);
         auto& oLevels = oCatalogue.moBitmapLevels;
@@ -60,7 +62,7 @@ public:
     void DropLevel(unsigned int nLevel, const krv::datasources::AuxiliaryData& oBook, const Place&) override
     {
         Catalogue& oCatalogue = moDataset.mpoWriter->GetCatalogue();
-        for (const unsigned int nBitmap : moDataset.GetBitmapList())
+        for (const unsigned int nBitmap : moDataset.ListSegments(Segment::BITMAP))
         {
             Plane& oPlane = *oCatalogue.moSegments.at(nBitmap).mpoPlane;
             moDataset.mpoWriter->DropTable(*oPlane.moTables.at(nLevel));
@@ -94,7 +96,7 @@ public:
 private:
     void Store(const krv::datasources::AuxiliaryData& oBook)
     {
-        const std::vector<unsigned int> oList = moDataset.GetBitmapList();
+        const std::vector<unsigned int> oList = moDataset.ListSegments(Segment::BITMAP);
         for (unsigned int nAt = 0; nAt < oList.size(); ++nAt)
             moDataset.mpoWriter->GetCatalogue().moSegments.at(oList[nAt]).moMetadata = oBook.GetChanMetadata(nAt + 1);
         moDataset.mpoWriter->Touch();
@@ -123,11 +125,22 @@ std::shared_ptr<support::BlockImage> KrvdskDataset::OpenBitmap(unsigned int nBit
     return poImage;
 }
 
+std::vector<unsigned int> KrvdskDataset::GetBitmapList() const
+{
+    return ListWithLinked(Segment::BITMAP, &krv::datasources::IBitmapDataset::GetBitmapList);
+}
+
 krv::datasources::IRasterIO* KrvdskDataset::GetBitmapIO(const std::vector<unsigned int>& oBitmaps)
 {
     std::vector<std::unique_ptr<krv::datasources::IRasterIO>> oParts;
     for (const unsigned int nBitmap : oBitmaps)
     {
+        if (auto* const poTheirs = FindLinkedBitmap(nBitmap))
+        {
+            oParts.push_back(std::make_unique<LinkedIO>(mpoLink, LinkedIO::Size{GetWidth(), GetHeight()},
+                                                        [&] { return poTheirs->GetBitmapIO({nBitmap}); }));
+            continue;
+        }
         GetSegment(Segment::BITMAP, nBitmap, Place::Current());
         oParts.push_back(std::make_unique<support::RasterIO>(OpenBitmap(nBitmap, 1), std::vector<unsigned int>{1}));
     }
@@ -159,12 +172,14 @@ void KrvdskDataset::DeleteBitmap(unsigned int nBitmap)
     std::erase_if(moBitmaps, [nBitmap](const auto& oOpened)
                   { return oOpened.first.first == nBitmap || oOpened.first.first == 0; });
     Catalogue& oCatalogue = mpoWriter->GetCatalogue();
-    if (GetBitmapList().empty())
+    if (ListSegments(Segment::BITMAP).empty())
         oCatalogue.moBitmapLevels.clear();
 }
 
 std::string KrvdskDataset::GetBitmapDescription(unsigned int nBitmap) const
 {
+    if (const auto* const poTheirs = FindLinkedBitmap(nBitmap))
+        return poTheirs->GetBitmapDescription(nBitmap);
     return GetSegment(Segment::BITMAP, nBitmap, Place::Current()).moDescription;
 }
 
@@ -176,6 +191,8 @@ void KrvdskDataset::SetBitmapDescription(unsigned int nBitmap, const std::string
 // What it says of its levels is kept by their manager.
 krv::datasources::MetadataMap KrvdskDataset::GetBitmapMetadata(unsigned int nBitmap) const
 {
+    if (const auto* const poTheirs = FindLinkedBitmap(nBitmap))
+        return poTheirs->GetBitmapMetadata(nBitmap);
     krv::datasources::AuxiliaryData oBook(1);
     oBook.SetChanMetadata(GetSegment(Segment::BITMAP, nBitmap, Place::Current()).moMetadata, 1);
     for (const unsigned int nLevel : GetCatalogue().moBitmapLevels)
@@ -196,11 +213,24 @@ void KrvdskDataset::SetBitmapMetadata(unsigned int nBitmap, const krv::datasourc
 
 krv::datasources::IOverviewManager* KrvdskDataset::GetBitmapOverviewManager()
 {
-    if (GetBitmapList().empty())
-        return nullptr;
-    if (!mpoBitmapLevels)
-        mpoBitmapLevels = std::make_shared<BitmapLevels>(*this);
-    return new support::OverviewManager(*this, *mpoBitmapLevels);
+    std::unique_ptr<krv::datasources::IOverviewManager> poOwn;
+    if (!ListSegments(Segment::BITMAP).empty())
+    {
+        if (!mpoBitmapLevels)
+            mpoBitmapLevels = std::make_shared<BitmapLevels>(*this);
+        poOwn = std::make_unique<support::OverviewManager>(*this, *mpoBitmapLevels);
+    }
+    auto* const poLinked = mpoLink ? mpoLink->Find<krv::datasources::IBitmapDataset>() : nullptr;
+    std::unique_ptr<krv::datasources::IOverviewManager> poTheirs(
+        poLinked != nullptr ? poLinked->GetBitmapOverviewManager() : nullptr);
+    if (!poTheirs)
+        return poOwn.release();
+    const auto Source = [this](unsigned int nBitmap)
+    {
+        return FindLinkedBitmap(nBitmap) != nullptr ? nBitmap : 0;
+    };
+    return new LinkedLevels(mpoLink, std::move(poOwn), std::move(poTheirs), Source,
+                            static_cast<unsigned int>(GetBitmapList().size()));
 }
 
 } // namespace krv::plugins::krvdsk

@@ -25,9 +25,8 @@ krv::datasources::IDataset* KrvdskBuilder::Open(const std::string& fileName, Acc
 
 krv::datasources::IDataset* KrvdskBuilder::Create(const std::string& fileName, const std::string& options)
 {
-    const CreateOptions oOptions = CreateOptions::Parse(options);
-    if (oOptions.moLinked)
-        throw DataException(fileName + ": the pixels of another file cannot be linked yet (option FILENOCREATE)");
+    CreateOptions oOptions = CreateOptions::Parse(options);
+    oOptions.moDefaults.moLinkPath = oOptions.moLinked.value_or(std::string());
     return new KrvdskDataset(GetFileFormat(), std::make_shared<StoreWriter>(fileName, oOptions.moDefaults));
 }
 

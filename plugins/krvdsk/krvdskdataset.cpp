@@ -1,6 +1,7 @@
 #include "plugins/krvdsk/krvdskdataset.h"
 
 #include "gobs/raster/rasterinfo.h"
+#include "plugins/krvdsk/link/linkedsource.h"
 #include "plugins/support/codec/checksum.h"
 #include "toolkit/exceptions/exceptions.h"
 
@@ -63,6 +64,7 @@ void KrvdskDataset::ShowFile()
     if (oCatalogue.mbPlaced)
         oRecord.SetGeocoding(oCatalogue.moGeocoding);
     ShowRecord(std::move(oRecord));
+    ShowLink();
     ShowImage();
 }
 
@@ -92,7 +94,10 @@ void KrvdskDataset::Create(unsigned int nWidth, unsigned int nHeight, const std:
     {
         oCatalogue.mnWidth = nWidth;
         oCatalogue.mnHeight = nHeight;
-        AddPlanes(oCatalogue, oTypes, oPlace);
+        if (oCatalogue.moLinkPath.empty())
+            AddPlanes(oCatalogue, oTypes, oPlace);
+        else
+            LinkChannels(oCatalogue, oTypes, oPlace);
         mpoWriter->LayOut();
         mpoStore = mpoWriter->GetStore();
         ShowFile();
@@ -134,8 +139,11 @@ std::shared_ptr<support::IBlockSource> KrvdskDataset::MakeLevelSource(unsigned i
     {
         ForgetOldPixels();
     };
-    return MakeSource(GetCatalogue().moPlanes, nLevel,
-                      nLevel == 1 ? std::function<void()>(BeforeWrite) : std::function<void()>());
+    const auto poOwn = MakeSource(GetCatalogue().moPlanes, nLevel,
+                                  nLevel == 1 ? std::function<void()>(BeforeWrite) : std::function<void()>());
+    if (GetCatalogue().moLinked.empty())
+        return poOwn;
+    return std::make_shared<LinkedSource>(mpoLink, GetCatalogue().moLinked, nLevel, poOwn);
 }
 
 void KrvdskDataset::StoreRecord(const support::RecordText& oRecord) const
@@ -196,12 +204,20 @@ void KrvdskDataset::DeleteChannel(unsigned int nChannel)
     std::iota(oSources.begin(), oSources.end(), 1u);
     oSources.erase(oSources.begin() + (nChannel - 1));
     oWriter.StoreHeld();
+    auto& oLinked = oWriter.GetCatalogue().moLinked;
+    const unsigned int nLinkedPlanes = LinkedSource::CountPlanes(oLinked);
+    if (oAt.mnPlane < nLinkedPlanes)
+    {
+        oLinked.erase(oLinked.begin() + (nChannel - 1));
+        return ChangeChannels(oSources);
+    }
     auto& oPlanes = oWriter.GetCatalogue().moPlanes;
-    const std::shared_ptr<Plane> poOld = oPlanes[oAt.mnPlane];
+    const std::size_t nPlane = oAt.mnPlane - nLinkedPlanes;
+    const std::shared_ptr<Plane> poOld = oPlanes[nPlane];
     if (poOld->GetChannels() == 1)
     {
         oWriter.DropPlane(*poOld);
-        oPlanes.erase(oPlanes.begin() + oAt.mnPlane);
+        oPlanes.erase(oPlanes.begin() + static_cast<std::ptrdiff_t>(nPlane));
         return ChangeChannels(oSources);
     }
     std::size_t nStored = 0;
@@ -286,6 +302,7 @@ krv::datasources::IHistoryIO* KrvdskDataset::GetHistoryIO(unsigned int nChannel)
 void KrvdskDataset::Close()
 {
     RecordDataset::Close();
+    mpoLink.reset(); // I/O objects keep theirs
     ForgetOpened();
     moBitmaps.clear();
 }

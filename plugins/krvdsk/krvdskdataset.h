@@ -2,15 +2,18 @@
 
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/ihistoryio.h"
+#include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/ilutdataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/interfaces/iverifieddataset.h"
+#include "plugins/krvdsk/link/link.h"
 #include "plugins/krvdsk/pixels/tilesource.h"
 #include "plugins/krvdsk/store/storewriter.h"
 #include "plugins/support/overviewmanager.h"
 #include "plugins/support/recorddataset.h"
 
+#include <algorithm>
 #include <functional>
 #include <map>
 #include <memory>
@@ -29,6 +32,7 @@ class KrvdskDataset : public support::RecordDataset,
                       public krv::datasources::IBitmapDataset,
                       public krv::datasources::IPCTDataset,
                       public krv::datasources::ILUTDataset,
+                      public krv::datasources::ILinkedDataset,
                       public krv::datasources::IStorageDataset,
                       public krv::datasources::IVerifiedDataset
 {
@@ -47,8 +51,14 @@ public:
     void DeleteChannel(unsigned int nChannel) override;
     krv::datasources::IHistoryIO* GetHistoryIO(unsigned int nChannel) override;
     void Close() override;
+    bool IsLinked() const override { return !GetCatalogue().moLinkPath.empty(); }
+    krv::datasources::IRasterIO* GetRasterIO(const std::vector<unsigned int>& oChannels) override;
+    krv::datasources::IOverviewManager* GetOverviewManager() override;
+    std::vector<std::string> GetLinkedFiles() const override;
 
-    std::vector<unsigned int> GetBitmapList() const override { return ListSegments(Segment::BITMAP); }
+    // What the linked file has of these is seen too, under the numbers that it has there, unless the file has its own
+    // under them. It is not changed from here.
+    std::vector<unsigned int> GetBitmapList() const override;
     krv::datasources::IRasterIO* GetBitmapIO(const std::vector<unsigned int>& oBitmaps) override;
     void DeleteBitmap(unsigned int nBitmap) override;
     unsigned int CreateBitmap() override;
@@ -58,7 +68,7 @@ public:
     void SetBitmapMetadata(unsigned int nBitmap, const krv::datasources::MetadataMap& oMetadata) override;
     krv::datasources::IOverviewManager* GetBitmapOverviewManager() override;
 
-    std::vector<unsigned int> GetPCTList() const override { return ListSegments(Segment::PCT); }
+    std::vector<unsigned int> GetPCTList() const override;
     krv::gobs::PCT* GetPCT(unsigned int nPCT) const override;
     unsigned int GetPCTChannel(unsigned int nPCT) const override;
     std::string GetPCTDescription(unsigned int nPCT) const override;
@@ -67,7 +77,7 @@ public:
     void SetPCTDescription(unsigned int nPCT, const std::string& oDescription) override;
     void DeletePCT(unsigned int nPCT) override;
 
-    std::vector<unsigned int> GetLUTList() const override { return ListSegments(Segment::LUT); }
+    std::vector<unsigned int> GetLUTList() const override;
     krv::datasources::LookupTable GetLUT(unsigned int nLUT) const override;
     unsigned int GetLUTChannel(unsigned int nLUT) const override;
     std::string GetLUTDescription(unsigned int nLUT) const override;
@@ -92,6 +102,23 @@ private:
     // Of a file that is changed; throws DataException for any other.
     StoreWriter& GetWriter(const char* pWhat, const Place& oPlace) const;
     void ShowFile();
+    void ShowLink();
+    void LinkChannels(Catalogue& oCatalogue, const std::vector<krv::gobs::DataType>& oTypes, const Place& oPlace) const;
+    // The number of a channel in the linked file, 0 for one of the file's own.
+    unsigned int FindLinked(unsigned int nChannel) const;
+    // The channel by which a channel of the linked file is seen; 0 when it is not.
+    unsigned int FindOwnChannel(unsigned int nTheirs) const;
+    const krv::datasources::IPCTDataset* FindLinkedPCT(unsigned int nPCT) const;
+    const krv::datasources::ILUTDataset* FindLinkedLUT(unsigned int nLUT) const;
+    krv::datasources::IBitmapDataset* FindLinkedBitmap(unsigned int nBitmap) const;
+    // The numbers of segments of a kind, and those that the linked file has.
+    template <class Facet>
+    std::vector<unsigned int> ListWithLinked(const std::string& kind,
+                                             std::vector<unsigned int> (Facet::*pList)() const) const;
+    // The linked file's facet when it has that number and the file itself has not; else null.
+    template <class Facet>
+    Facet* FindLinkedSegment(const std::string& kind, unsigned int nNumber,
+                             std::vector<unsigned int> (Facet::*pList)() const) const;
     void ShowImage();
     std::shared_ptr<support::IBlockSource> MakeSource(std::vector<std::shared_ptr<Plane>> oPlanes, unsigned int nLevel,
                                                       std::function<void()> oBeforeWrite) const;
@@ -116,11 +143,43 @@ private:
 
     std::shared_ptr<StoreWriter> mpoWriter; // null when the file is only read
     std::shared_ptr<StoreFile> mpoStore;
-    Catalogue moCatalogue; // of a file that is only read
+    std::shared_ptr<Link> mpoLink; // null when all channels are the file's own
+    Catalogue moCatalogue;         // of a file that is only read
     std::vector<std::vector<std::string>> moHistories;
     std::map<unsigned int, std::unique_ptr<History>> moHistoryFacets;
     std::shared_ptr<BitmapLevels> mpoBitmapLevels;
     std::map<std::pair<unsigned int, unsigned int>, std::shared_ptr<support::BlockImage>> moBitmaps; // number, level
 };
+
+template <class Facet>
+std::vector<unsigned int> KrvdskDataset::ListWithLinked(const std::string& kind,
+                                                        std::vector<unsigned int> (Facet::*pList)() const) const
+{
+    std::vector<unsigned int> oList = ListSegments(kind);
+    if (const Facet* const poTheirs = mpoLink ? mpoLink->Find<Facet>() : nullptr)
+    {
+        const std::vector<unsigned int> oTheirs = (poTheirs->*pList)();
+        oList.insert(oList.end(), oTheirs.begin(), oTheirs.end());
+        std::sort(oList.begin(), oList.end());
+        oList.erase(std::unique(oList.begin(), oList.end()), oList.end());
+    }
+    return oList;
+}
+
+template <class Facet>
+Facet* KrvdskDataset::FindLinkedSegment(const std::string& kind, unsigned int nNumber,
+                                        std::vector<unsigned int> (Facet::*pList)() const) const
+{
+    Facet* const poTheirs = mpoLink ? mpoLink->Find<Facet>() : nullptr;
+    if (poTheirs == nullptr)
+        return nullptr;
+    const std::vector<unsigned int> oOwn = ListSegments(kind);
+    const std::vector<unsigned int> oTheirs = (poTheirs->*pList)();
+    const auto Has = [nNumber](const std::vector<unsigned int>& oList)
+    {
+        return std::find(oList.begin(), oList.end(), nNumber) != oList.end();
+    };
+    return Has(oTheirs) && !Has(oOwn) ? poTheirs : nullptr;
+}
 
 } // namespace krv::plugins::krvdsk

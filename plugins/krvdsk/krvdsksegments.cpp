@@ -112,7 +112,9 @@ const Segment& KrvdskDataset::GetSegment(const std::string& kind, unsigned int n
     const auto& oSegments = GetCatalogue().moSegments;
     const auto oFound = oSegments.find(nNumber);
     if (oFound == oSegments.end() || oFound->second.moKind != kind)
-        Refuse("there is no segment " + std::to_string(nNumber) + " of the kind " + kind, oPlace);
+        Refuse("there is no segment " + std::to_string(nNumber) + " of the kind " + kind +
+                   (mpoLink ? "; what " + mpoLink->GetName() + " has of these is changed there" : std::string()),
+               oPlace);
     return oFound->second;
 }
 
@@ -171,19 +173,30 @@ void KrvdskDataset::DeleteSegment(const std::string& kind, unsigned int nNumber,
     mpoWriter->GetCatalogue().moSegments.erase(nNumber);
 }
 
+std::vector<unsigned int> KrvdskDataset::GetPCTList() const
+{
+    return ListWithLinked(Segment::PCT, &krv::datasources::IPCTDataset::GetPCTList);
+}
+
 krv::gobs::PCT* KrvdskDataset::GetPCT(unsigned int nPCT) const
 {
+    if (const auto* const poTheirs = FindLinkedPCT(nPCT))
+        return poTheirs->GetPCT(nPCT);
     const std::vector<unsigned char> oBytes = ReadSegment(Segment::PCT, nPCT, Place::Current());
     return new krv::gobs::PCT(ReadPCT({oBytes, GetFileName(), "PCT " + std::to_string(nPCT)}));
 }
 
 unsigned int KrvdskDataset::GetPCTChannel(unsigned int nPCT) const
 {
+    if (const auto* const poTheirs = FindLinkedPCT(nPCT))
+        return FindOwnChannel(poTheirs->GetPCTChannel(nPCT));
     return GetSegment(Segment::PCT, nPCT, Place::Current()).mnChannel;
 }
 
 std::string KrvdskDataset::GetPCTDescription(unsigned int nPCT) const
 {
+    if (const auto* const poTheirs = FindLinkedPCT(nPCT))
+        return poTheirs->GetPCTDescription(nPCT);
     return GetSegment(Segment::PCT, nPCT, Place::Current()).moDescription;
 }
 
@@ -207,19 +220,30 @@ void KrvdskDataset::DeletePCT(unsigned int nPCT)
     DeleteSegment(Segment::PCT, nPCT, Place::Current());
 }
 
+std::vector<unsigned int> KrvdskDataset::GetLUTList() const
+{
+    return ListWithLinked(Segment::LUT, &krv::datasources::ILUTDataset::GetLUTList);
+}
+
 krv::datasources::LookupTable KrvdskDataset::GetLUT(unsigned int nLUT) const
 {
+    if (const auto* const poTheirs = FindLinkedLUT(nLUT))
+        return poTheirs->GetLUT(nLUT);
     const std::vector<unsigned char> oBytes = ReadSegment(Segment::LUT, nLUT, Place::Current());
     return ReadLUT({oBytes, GetFileName(), "LUT " + std::to_string(nLUT)});
 }
 
 unsigned int KrvdskDataset::GetLUTChannel(unsigned int nLUT) const
 {
+    if (const auto* const poTheirs = FindLinkedLUT(nLUT))
+        return FindOwnChannel(poTheirs->GetLUTChannel(nLUT));
     return GetSegment(Segment::LUT, nLUT, Place::Current()).mnChannel;
 }
 
 std::string KrvdskDataset::GetLUTDescription(unsigned int nLUT) const
 {
+    if (const auto* const poTheirs = FindLinkedLUT(nLUT))
+        return poTheirs->GetLUTDescription(nLUT);
     return GetSegment(Segment::LUT, nLUT, Place::Current()).moDescription;
 }
 

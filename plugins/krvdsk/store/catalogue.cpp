@@ -23,6 +23,7 @@ constexpr const char* SEGMENT = "Segm";
 constexpr const char* PLACE = "Geoc";
 constexpr const char* REFERENCE = "Crs ";
 constexpr const char* RECORD = "Meta";
+constexpr const char* LINK = "Link";
 
 void AddMap(BytesWriter& oWriter, const krv::datasources::MetadataMap& oMap)
 {
@@ -45,12 +46,17 @@ krv::datasources::MetadataMap ReadMap(BytesReader& oReader)
     return oMap;
 }
 
-void AddPlane(BytesWriter& oWriter, const Plane& oPlane)
+unsigned int GetTypeCode(const krv::gobs::DataType& oType)
 {
     krv::gobs::NativeDataTypeCode eType = krv::gobs::eDT_BIT;
-    oPlane.moType.FindNativeCode(eType);
+    oType.FindNativeCode(eType);
+    return static_cast<unsigned int>(eType);
+}
+
+void AddPlane(BytesWriter& oWriter, const Plane& oPlane)
+{
     for (const unsigned int nByte :
-         {static_cast<unsigned int>(oPlane.meStorage), static_cast<unsigned int>(eType),
+         {static_cast<unsigned int>(oPlane.meStorage), GetTypeCode(oPlane.moType),
           static_cast<unsigned int>(oPlane.meCoding), unsigned{oPlane.mnPredictor}, unsigned{oPlane.mnCodingLevel}})
         oWriter.AddNumber(nByte, 1);
     oWriter.AddNumber(oPlane.moThere.size(), 4);
@@ -135,7 +141,7 @@ std::uint64_t Catalogue::CountTiles(unsigned int nLevel) const
 
 unsigned int Catalogue::CountChannels() const
 {
-    unsigned int nChannels = 0;
+    auto nChannels = static_cast<unsigned int>(moLinked.size());
     for (const std::shared_ptr<Plane>& poPlane : moPlanes)
         nChannels += poPlane->GetChannels();
     return nChannels;
@@ -207,7 +213,7 @@ void Catalogue::Describe() const
         for (const auto& [nLevel, poTable] : oPlane.moTables)
             poTable->SetDescription(nLevel == 1 ? what : what + ", level " + std::to_string(nLevel));
     };
-    unsigned int nFirst = 1;
+    unsigned int nFirst = static_cast<unsigned int>(moLinked.size()) + 1;
     for (const std::shared_ptr<Plane>& poPlane : moPlanes)
     {
         Name(*poPlane, DescribePlane(nFirst, poPlane->GetChannels()));
@@ -242,6 +248,18 @@ std::vector<unsigned char> Catalogue::Write() const
                 AddNumbers(oItem, moLevels);
                 AddNumbers(oItem, moBitmapLevels);
             });
+    if (!moLinkPath.empty())
+        AddItem(LINK,
+                [this](BytesWriter& oItem)
+                {
+                    oItem.AddText(moLinkPath);
+                    oItem.AddNumber(moLinked.size(), 4);
+                    for (const Link::Channel& oChannel : moLinked)
+                    {
+                        oItem.AddNumber(oChannel.mnNumber, 4);
+                        oItem.AddNumber(GetTypeCode(oChannel.moType), 1);
+                    }
+                });
     for (const std::shared_ptr<Plane>& poPlane : moPlanes)
         AddItem(PLANE, [&poPlane](BytesWriter& oItem) { AddPlane(oItem, *poPlane); });
     for (const auto& oPair : moSegments)
@@ -326,6 +344,22 @@ std::shared_ptr<Plane> Catalogue::ReadPlane(BytesReader& oItem, bool bBitmap) co
     return poPlane;
 }
 
+void Catalogue::ReadLink(BytesReader oItem)
+{
+    moLinkPath = oItem.ReadText();
+    for (std::uint32_t nLeft = oItem.ReadCount(); nLeft > 0; --nLeft)
+    {
+        const unsigned int nNumber = oItem.ReadCount();
+        const std::uint64_t nType = oItem.ReadNumber(1);
+        if (nNumber == 0 || nType >= krv::gobs::eDT_BIT || moLinked.size() >= MOST_CHANNELS)
+            oItem.Fail("channel " + std::to_string(nNumber) + " of type " + std::to_string(nType) +
+                       " cannot be linked");
+        moLinked.push_back({nNumber, static_cast<krv::gobs::NativeDataTypeCode>(nType)});
+    }
+    if (moLinkPath.empty() || moLinkPath.find('\0') != moLinkPath.npos)
+        oItem.Fail("a link leads nowhere");
+}
+
 void Catalogue::ReadSegment(BytesReader oItem)
 {
     const unsigned int nNumber = oItem.ReadCount();
@@ -365,6 +399,11 @@ Catalogue Catalogue::Read(const StoreFile& oStore, const std::vector<unsigned ch
         {
             oCatalogue.moPlanes.push_back(oCatalogue.ReadPlane(oItem, false));
             nChannels += oCatalogue.moPlanes.back()->GetChannels();
+        }
+        else if (name == LINK && oCatalogue.moLinkPath.empty())
+        {
+            oCatalogue.ReadLink(oItem);
+            nChannels += oCatalogue.moLinked.size();
         }
         else if (name == SEGMENT)
             oCatalogue.ReadSegment(oItem);

@@ -2,6 +2,7 @@
 
 #include "datasources/interfaces/metadatamap.h"
 #include "gobs/raster/datatype.h"
+#include "plugins/krvdsk/link/link.h"
 #include "plugins/krvdsk/store/bytes.h"
 #include "plugins/krvdsk/store/storefile.h"
 #include "plugins/krvdsk/store/tiletable.h"
@@ -32,8 +33,7 @@ const char* GetCodingName(Coding eCoding);
 // Where the pixels of a plane are. The values are those of the file.
 enum class Storage : std::uint8_t
 {
-    eTiles = 0,
-    eLinked = 1 // in another file
+    eTiles = 0
 };
 
 // Channels of one type that are stored together, pixel interleaved, with their levels; or a bitmap.
@@ -110,8 +110,11 @@ struct Catalogue
     std::uint8_t mnPredictor = 0; // 0: the usual one
     bool mbSeparate = false;      // every channel in a plane of its own
 
-    std::vector<std::shared_ptr<Plane>> moPlanes; // channels count through them
-    std::vector<unsigned int> moLevels;           // ascending, from 2 on
+    // Channels count through those that lie in another file, and then through the planes.
+    std::string moLinkPath; // of that file, from the folder of this one; empty: there is none
+    std::vector<Link::Channel> moLinked;
+    std::vector<std::shared_ptr<Plane>> moPlanes;
+    std::vector<unsigned int> moLevels; // ascending, from 2 on
     std::map<unsigned int, Segment> moSegments;
     std::vector<unsigned int> moBitmapLevels;
     unsigned int mnNextSegment = 1;
@@ -141,6 +144,7 @@ private:
     void ReadImage(BytesReader oItem);
     std::shared_ptr<Plane> ReadPlane(BytesReader& oItem, bool bBitmap) const;
     void ReadSegment(BytesReader oItem);
+    void ReadLink(BytesReader oItem);
     // Why tiles of such a plane cannot be; empty when they can.
     std::string FindObstacle(const Plane& oPlane) const;
 };
