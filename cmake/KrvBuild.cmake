@@ -116,18 +116,26 @@ function(krv_add_test name)
   gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT 600)
 endfunction()
 
-# krv_average_kernels(VARIABLE): the source files of the inner loops of averages, with the options that they want. These
-# hold for the folder that calls this: the loops are no part of a library's interface, whoever wants them compiles them in.
-function(krv_average_kernels variable)
-  set(folder ${CMAKE_SOURCE_DIR}/gobs/resampling/detail)
-  set(sources ${folder}/averagekernels.cpp ${folder}/averagekernelsavx2.cpp ${folder}/averagekernelsavx512.cpp)
+# krv_vector_kernels(VARIABLE STEM): the source files of inner loops that are compiled for each instruction set, with the
+# options that they want: gobs/STEM.cpp, STEMavx2.cpp and STEMavx512.cpp. These hold for the folder that calls this: the
+# loops are no part of a library's interface, whoever wants them compiles them in. Results do not depend on the
+# processor: products and sums are not contracted.
+function(krv_vector_kernels variable stem)
+  set(stem ${CMAKE_SOURCE_DIR}/gobs/${stem})
+  set(sources ${stem}.cpp ${stem}avx2.cpp ${stem}avx512.cpp)
   set_source_files_properties(${sources} PROPERTIES COMPILE_OPTIONS
-    "-O3;-fno-math-errno;-fno-trapping-math;-Wno-psabi")
+    "-O3;-fno-math-errno;-fno-trapping-math;-ffp-contract=off;-Wno-psabi")
   # The library asks the processor before it calls the wide ones.
   if(CMAKE_SYSTEM_PROCESSOR MATCHES "x86_64|amd64|AMD64")
-    set_property(SOURCE ${folder}/averagekernelsavx2.cpp APPEND PROPERTY COMPILE_OPTIONS -mavx2)
-    set_property(SOURCE ${folder}/averagekernelsavx512.cpp APPEND PROPERTY
+    set_property(SOURCE ${stem}avx2.cpp APPEND PROPERTY COMPILE_OPTIONS -mavx2)
+    set_property(SOURCE ${stem}avx512.cpp APPEND PROPERTY
       COMPILE_OPTIONS -mavx512f -mavx512bw -mavx512dq -mavx512vl -mavx512vbmi)
   endif()
+  set(${variable} ${sources} PARENT_SCOPE)
+endfunction()
+
+# krv_average_kernels(VARIABLE): those of averages.
+function(krv_average_kernels variable)
+  krv_vector_kernels(sources resampling/detail/averagekernels)
   set(${variable} ${sources} PARENT_SCOPE)
 endfunction()

@@ -2,7 +2,9 @@
 
 #include "toolkit/core/numbertext.h"
 
+#include <filesystem>
 #include <string_view>
+#include <system_error>
 
 namespace krv::datasources
 {
@@ -62,6 +64,14 @@ bool ParseRefMetadataTag(const std::string& tag, std::string& file, std::string&
         return false;
     layer = segment.substr(0, nColon);
     return !layer.empty() && ParseSigned(segment.substr(nColon + 1), nNumber);
+}
+
+bool IsReferenceTo(const std::string& reference, const std::string& file)
+{
+    std::error_code oNone;
+    const std::filesystem::path oBeside = std::filesystem::path(file).parent_path() / reference;
+    return reference == file || std::filesystem::equivalent(reference, file, oNone) ||
+           std::filesystem::equivalent(oBeside, file, oNone);
 }
 
 } // namespace krv::datasources

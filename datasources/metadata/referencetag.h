@@ -20,4 +20,8 @@ KRV_DATASOURCES_API std::string BuildRefMetadataTag(const std::string& file, con
 KRV_DATASOURCES_API bool ParseRefMetadataTag(const std::string& tag, std::string& file, std::string& layer,
                                              unsigned int& nNumber);
 
+// Whether the file of a tag is this one: the tag names it as the user does, or as it lies beside the one that refers to
+// it.
+KRV_DATASOURCES_API bool IsReferenceTo(const std::string& reference, const std::string& file);
+
 } // namespace krv::datasources

@@ -130,6 +130,11 @@ BasicReader::BasicReader(IRasterDataset* poRasterDataset, IRasterIO* poRasterIO,
 
 BasicReader::~BasicReader() = default;
 
+void BasicReader::OwnDataset(bool bOwned)
+{
+    mpoChannels->SetOwned(bOwned);
+}
+
 void BasicReader::UseChannels(IDataset* poDataset, const std::vector<unsigned int>& oChannels,
                               std::unique_ptr<IRasterIO> oRasterIO, const Place& oPlace)
 {

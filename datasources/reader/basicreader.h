@@ -47,6 +47,8 @@ public:
     using RasterAccess::ReadRaster;
     void ReadRaster(krv::gobs::Raster* poRaster) override;
     IOverviewReaderAccessor* GetOverviewReaderAccessor() override;
+    // Whether the dataset goes with this reader, from now on.
+    void OwnDataset(bool bOwned);
 
 protected:
     // For derived readers, which set up their own state by SetDataset and SetRasterIO.

@@ -106,4 +106,9 @@ const std::vector<unsigned int>& RasterAccess::GetChannels() const
     return mpoChannels->GetChannels();
 }
 
+bool RasterAccess::IsOfBitmaps() const
+{
+    return mpoChannels->IsBitmaps();
+}
+
 } // namespace krv::datasources

@@ -40,6 +40,8 @@ public:
 
     IDataset* GetDataset() const override;
     const std::vector<unsigned int>& GetChannels() const override;
+    // Whether those numbers are of bitmaps.
+    bool IsOfBitmaps() const;
 
 protected:
     // No dataset, no channels, no margins, eMirror.

@@ -7,6 +7,7 @@
 #include "datasources/metadata/typednodata.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/detail/rasterchannels.h"
+#include "datasources/reader/detail/reducedvalidity.h"
 #include "gobs/mask/exactmaskdecision.h"
 #include "gobs/mask/mask.h"
 #include "gobs/raster/raster.h"
@@ -26,11 +27,7 @@ using krv::gobs::Mask;
 using krv::gobs::MaskDecisionBuilder;
 using krv::gobs::Raster;
 
-std::unique_ptr<const IMaskBuilder> ZeroOrNaN(unsigned int nChannel)
-{
-    const ExactMaskDecision oDecision(krv::gobs::eAnyChannel, {NoDataValue::FromUnsigned(0)}, {nChannel}, true);
-    return std::make_unique<MaskDecisionBuilder>(&oDecision);
-}
+using detail::ZeroOrNaN;
 
 // Marks what an extra channel over the region of the raster says to be background.
 std::unique_ptr<Mask> ReadBackground(BasicReader& oReader, const Raster& oRegion)
@@ -128,6 +125,14 @@ ValiditySource::ValiditySource(IDataset* poDataset, const std::vector<unsigned i
         mpoAlphaReader = std::make_unique<BasicReader>(poDataset, std::vector<unsigned int>{nAlpha}, false);
 }
 
+ValiditySource::ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels, unsigned int nWidth,
+                               unsigned int nHeight, BkgdRule eRule)
+    : ValiditySource(poDataset, oChannels, eRule)
+{
+    if (nWidth != mnImageWidth || nHeight != mnImageHeight)
+        UseLevel(*poDataset, nWidth, nHeight);
+}
+
 ValiditySource::ValiditySource(const IRasterReader& oReader, BkgdRule eRule)
     : mnImageWidth(oReader.GetWidth()), mnImageHeight(oReader.GetHeight())
 {
@@ -170,6 +175,17 @@ void ValiditySource::FindBitmap(IDataset& oDataset)
     mpoBitmapReader = std::make_unique<BasicReader>(poBitmaps, std::vector<unsigned int>{mnBitmap}, false);
     if (mpoBitmapReader->GetWidth() != mnImageWidth || mpoBitmapReader->GetHeight() != mnImageHeight)
         throw krv::DataException("Bitmap " + std::to_string(mnBitmap) + " is not of the image's size");
+}
+
+void ValiditySource::UseLevel(IDataset& oDataset, unsigned int nWidth, unsigned int nHeight)
+{
+    for (std::unique_ptr<BasicReader>* const poReader : {&mpoBitmapReader, &mpoAlphaReader})
+    {
+        if (*poReader != nullptr)
+            *poReader = detail::ReadReduced(oDataset, std::move(*poReader), nWidth, nHeight);
+    }
+    mnImageWidth = nWidth;
+    mnImageHeight = nHeight;
 }
 
 void ValiditySource::UseAlphaOfRaster(unsigned int nPosition)

@@ -37,6 +37,10 @@ public:
     // bNoData: without it mask bitmap and alpha alone.
     explicit ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels = {},
                             krv::gobs::BkgdRule eRule = krv::gobs::eAllChannels, bool bNoData = true);
+    // For rasters of a level of that size, or of the image itself, with everything that the dataset says: a pixel of a
+    // level is valid by mask bitmap or alpha where any pixel of its box is. Throws the same.
+    ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels, unsigned int nWidth,
+                   unsigned int nHeight, krv::gobs::BkgdRule eRule = krv::gobs::eAllChannels);
     // For rasters of the reader, a level's too: by what its metadata and its channels say. There is no bitmap, and
     // alpha counts only when it is one of the reader's channels. The reader may go away.
     explicit ValiditySource(const IRasterReader& oReader, krv::gobs::BkgdRule eRule = krv::gobs::eAllChannels);
@@ -63,6 +67,7 @@ private:
                     krv::gobs::BkgdRule eRule);
     void FindBitmap(IDataset& oDataset);
     void UseAlphaOfRaster(unsigned int nPosition);
+    void UseLevel(IDataset& oDataset, unsigned int nWidth, unsigned int nHeight);
 
     std::unique_ptr<const krv::gobs::IMaskBuilder> mpoNoData;
     std::unique_ptr<const krv::gobs::IMaskBuilder> mpoAlphaOfRaster;

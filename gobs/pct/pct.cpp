@@ -78,8 +78,15 @@ const PCT::Entry* PCT::Find(double nValue) const
 
 RGBTuple<unsigned char> PCT::GetValue(double nValue) const
 {
-    std::uint16_t nAlpha = 0;
-    const RGBTuple<std::uint16_t> oColour = GetValue16(nValue, nAlpha);
+    unsigned char nAlpha = 0;
+    return GetValue(nValue, nAlpha);
+}
+
+RGBTuple<unsigned char> PCT::GetValue(double nValue, unsigned char& nAlpha) const
+{
+    std::uint16_t nWideAlpha = 0;
+    const RGBTuple<std::uint16_t> oColour = GetValue16(nValue, nWideAlpha);
+    nAlpha = Narrow(nWideAlpha);
     return {Narrow(oColour.red), Narrow(oColour.green), Narrow(oColour.blue)};
 }
 

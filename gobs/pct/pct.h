@@ -34,7 +34,9 @@ public:
     // The colour of a value: that of its range; below the first range the first colour, above the last the last; in a
     // gap the range before it; NaN, and a table without entries, give the background colour.
     RGBTuple<unsigned char> GetValue(double nValue) const;
-    // The same in 16 bits, with alpha; the background's alpha is 0.
+    // The same with alpha; the background's is 0.
+    RGBTuple<unsigned char> GetValue(double nValue, unsigned char& nAlpha) const;
+    // The same in 16 bits.
     RGBTuple<std::uint16_t> GetValue16(double nValue, std::uint16_t& nAlpha) const;
 
     // Linear interpolation between the centres of neighbouring ranges; off at first.

@@ -2,9 +2,8 @@
 
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
-#include "datasources/interfaces/ipctdataset.h"
 #include "datasources/metadata/displaydefaults.h"
-#include "datasources/metadata/referencetag.h"
+#include "datasources/reader/derived/findpct.h"
 #include "datasources/reader/validitysource.h"
 #include "gobs/raster/pixelvalue.h"
 #include "operations/job/exceptions.h"
@@ -63,24 +62,7 @@ bool UseDefaults(const SourceFile& oFile, DisplayChoice& oChoice)
 
 std::shared_ptr<krv::gobs::PCT> TableOf(const SourceFile& oFile, unsigned int nChannel)
 {
-    auto* const poTables = dynamic_cast<krv::datasources::IPCTDataset*>(&oFile.GetDataset());
-    if (poTables == nullptr)
-        return nullptr;
-    const auto oList = poTables->GetPCTList();
-    std::string file, layer;
-    unsigned int nWanted = 0;
-    const auto& oMetadata = oFile.GetMetadata();
-    if (nChannel <= oMetadata.GetChannelCount() &&
-        krv::datasources::ParseRefMetadataTag(oMetadata.GetChanMetadataValue("DEFAULT_PCT_REF", nChannel), file, layer,
-                                              nWanted) &&
-        IsReferenceTo(file, oFile.GetName()) && std::find(oList.begin(), oList.end(), nWanted) != oList.end())
-        return std::shared_ptr<krv::gobs::PCT>(poTables->GetPCT(nWanted));
-    for (const unsigned int nTable : oList)
-    {
-        if (poTables->GetPCTChannel(nTable) == nChannel)
-            return std::shared_ptr<krv::gobs::PCT>(poTables->GetPCT(nTable));
-    }
-    return nullptr;
+    return krv::datasources::FindPCT(oFile.GetDataset(), nChannel);
 }
 
 bool UseRoles(const SourceFile& oFile, DisplayChoice& oChoice)

@@ -2,10 +2,9 @@
 
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
-#include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/reader/basicreader.h"
-#include "datasources/reader/ioverviewaccessor.h"
+#include "datasources/reader/derived/pctrasterreader.h"
 #include "gobs/pct/pct.h"
 #include "operations/job/exceptions.h"
 #include "operations/job/progress.h"
@@ -78,6 +77,23 @@ std::vector<Plane> ReadPlanes(const SourceFile& oFile, const std::vector<unsigne
             oPlanes[oGroups[g].positions[i]] = std::move(oFound[i]);
     }
     return oPlanes;
+}
+
+// Red, green, blue and alpha of the channel that has a colour table.
+std::vector<Plane> ReadColours(const SourceFile& oFile, const DisplayChoice& oChoice, const Size& oSize,
+                               const Threads& oThreads)
+{
+    const auto Read = [&](const SourceFile& oSource)
+    {
+        auto poValues = std::make_unique<krv::datasources::BasicReader>(&oSource.GetDataset(), oChoice.channels, false);
+        auto poColours = std::make_unique<krv::datasources::PCTRasterReader>(poValues.get(), *oChoice.table, true,
+                                                                             krv::datasources::eWithAlpha);
+        (void)poValues.release();
+        return LevelReader::AtLeast(std::move(poColours), oSize.width, oSize.height, oSource.GetName());
+    };
+    ProgressCounter oCounter(oThreads.progress, "view", ReaderBytes(Read(oFile).Get()));
+    return Reduce(oFile, Read, std::vector<OptionalNoData>(4), oSize.width, oSize.height, Resampling::eNearest,
+                  oCounter, oThreads.executor);
 }
 
 void Multiply(std::vector<float>& oOpacity, const Plane& oPlane, float nFull)
@@ -184,21 +200,13 @@ void PaintStretched(Picture& oPicture, const std::vector<Plane>& oPlanes, const 
     }
 }
 
-void PaintTable(Picture& oPicture, const Plane& oPlane, const krv::gobs::PCT& oTable, std::vector<float>& oOpacity)
+// The picture of a channel with a colour table; its alpha holds what is not valid too.
+void PaintColours(Picture& oPicture, const std::vector<Plane>& oColours)
 {
-    const auto Byte = [](unsigned int n)
+    for (std::size_t c = 0; c < oColours.size(); ++c)
     {
-        return static_cast<std::uint8_t>((n + 128) / 257);
-    };
-    for (std::size_t i = 0; i < oPlane.values.size(); ++i)
-    {
-        std::uint16_t nAlpha = 65535;
-        const auto oColour = oTable.GetValue16(static_cast<double>(oPlane.values[i]), nAlpha);
-        std::uint8_t* const pPixel = oPicture.pixels.data() + i * oPicture.samples;
-        pPixel[0] = Byte(oColour.red);
-        pPixel[1] = Byte(oColour.green);
-        pPixel[2] = Byte(oColour.blue);
-        oOpacity[i] *= static_cast<float>(nAlpha) / 65535.0F;
+        for (std::size_t i = 0; i < oColours[c].values.size(); ++i)
+            oPicture.pixels[i * oPicture.samples + c] = static_cast<std::uint8_t>(oColours[c].values[i]);
     }
 }
 
@@ -236,26 +244,28 @@ QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOption
     oLook.choice = ChooseDisplay(oFile, oOptions.channels);
     const DisplayChoice& oChoice = oLook.choice;
     const Size oSize = FitInto(oRaster.GetWidth(), oRaster.GetHeight(), oOptions.size);
-    const Resampling eMethod =
-        oChoice.table != nullptr || !oOptions.average ? Resampling::eNearest : Resampling::eAverage;
+    oLook.picture = {oSize.width, oSize.height, 4, {}};
+    if (oChoice.table != nullptr)
+    {
+        oLook.picture.pixels.resize(std::size_t{oSize.width} * oSize.height * 4);
+        PaintColours(oLook.picture, ReadColours(oFile, oChoice, oSize, oThreads));
+        DropOpaqueAlpha(oLook.picture);
+        return oLook;
+    }
+    const Resampling eMethod = oOptions.average ? Resampling::eAverage : Resampling::eNearest;
     std::vector<Plane> oPlanes = ReadPlanes(oFile, oChoice.channels, oSize, eMethod, oThreads);
-    std::vector<float> oOpacity = FindOpacity(oFile, oChoice, oSize, oPlanes, oThreads);
+    const std::vector<float> oOpacity = FindOpacity(oFile, oChoice, oSize, oPlanes, oThreads);
 
     const bool bInks = oPlanes.size() == 4;
     if (bInks)
         MixInks(oPlanes, oChoice.inkFull);
 
-    oLook.picture = {oSize.width, oSize.height, oChoice.table != nullptr || oPlanes.size() == 3 ? 4U : 2U, {}};
-    oLook.picture.pixels.resize(static_cast<std::size_t>(oSize.width) * oSize.height * oLook.picture.samples);
-    if (oChoice.table != nullptr)
-        PaintTable(oLook.picture, oPlanes.front(), *oChoice.table, oOpacity);
-    else
-    {
-        for (std::size_t c = 0; c < oPlanes.size(); ++c)
-            oLook.stretches.push_back(FindStretch(oPlanes[c], bInks ? StretchMode::eNone : oOptions.stretch,
-                                                  oFile.GetType(oChoice.channels[c]) == krv::gobs::eDT_8U));
-        PaintStretched(oLook.picture, oPlanes, oLook.stretches, oChoice.inverted);
-    }
+    oLook.picture.samples = oPlanes.size() == 3 ? 4U : 2U;
+    oLook.picture.pixels.resize(std::size_t{oSize.width} * oSize.height * oLook.picture.samples);
+    for (std::size_t c = 0; c < oPlanes.size(); ++c)
+        oLook.stretches.push_back(FindStretch(oPlanes[c], bInks ? StretchMode::eNone : oOptions.stretch,
+                                              oFile.GetType(oChoice.channels[c]) == krv::gobs::eDT_8U));
+    PaintStretched(oLook.picture, oPlanes, oLook.stretches, oChoice.inverted);
     PaintOpacity(oLook.picture, oOpacity);
     DropOpaqueAlpha(oLook.picture);
     return oLook;

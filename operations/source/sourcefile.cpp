@@ -18,8 +18,6 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
-#include <filesystem>
-#include <system_error>
 
 namespace krv::operations
 {
@@ -71,14 +69,6 @@ std::string WhyUnreadable(const std::string& file)
     return {};
 }
 
-bool IsReferenceTo(const std::string& reference, const std::string& file)
-{
-    std::error_code oNone;
-    const std::filesystem::path oBeside = std::filesystem::path(file).parent_path() / reference;
-    return reference == file || std::filesystem::equivalent(reference, file, oNone) ||
-           std::filesystem::equivalent(oBeside, file, oNone);
-}
-
 LevelReader::LevelReader(std::unique_ptr<IRasterReader> poFull, std::unique_ptr<IOverviewReaderAccessor> poAccessor,
                          std::unique_ptr<IRasterReader> poLevel)
     : mpoFull(std::move(poFull)), mpoAccessor(std::move(poAccessor)), mpoLevel(std::move(poLevel))
@@ -98,6 +88,30 @@ SourceFile::Identity::Identity(const std::string& name)
     mnSize = oStatus.st_size;
     mnSeconds = oStatus.st_mtim.tv_sec;
     mnNanoseconds = oStatus.st_mtim.tv_nsec;
+}
+
+LevelReader LevelReader::AtLeast(std::unique_ptr<IRasterReader> poFull, unsigned int nWidth, unsigned int nHeight,
+                                 const std::string& name)
+{
+    std::unique_ptr<IOverviewReaderAccessor> poAccessor(poFull->GetOverviewReaderAccessor());
+    std::vector<unsigned int> oLevels = poAccessor != nullptr ? poAccessor->GetLevels() : std::vector<unsigned int>();
+    std::sort(oLevels.rbegin(), oLevels.rend());
+    for (const unsigned int nLevel : oLevels)
+    {
+        if (!poAccessor->IsLevelValid(nLevel))
+            continue;
+        try
+        {
+            std::unique_ptr<IRasterReader> poLevel(poAccessor->CreateRasterReader(nLevel));
+            if (poLevel->GetWidth() >= nWidth && poLevel->GetHeight() >= nHeight)
+                return {std::move(poFull), std::move(poAccessor), std::move(poLevel)};
+        }
+        catch (const krv::Exception&)
+        {
+            krv::nspio::Warning::Warn(fmt::format("{}: level {} cannot be read: {}", name, nLevel, CurrentMessage()));
+        }
+    }
+    return {std::move(poFull), nullptr, nullptr};
 }
 
 SourceFile::SourceFile(const std::string& name, AccessMode eMode)
@@ -235,26 +249,7 @@ LevelReader SourceFile::Read(const std::vector<unsigned int>& oChannels, unsigne
 LevelReader SourceFile::ReadAtLeast(const std::vector<unsigned int>& oChannels, unsigned int nWidth,
                                     unsigned int nHeight) const
 {
-    auto poFull = ReadFull(oChannels);
-    std::unique_ptr<IOverviewReaderAccessor> poAccessor(poFull->GetOverviewReaderAccessor());
-    std::vector<unsigned int> oLevels = poAccessor != nullptr ? poAccessor->GetLevels() : std::vector<unsigned int>();
-    std::sort(oLevels.rbegin(), oLevels.rend());
-    for (const unsigned int nLevel : oLevels)
-    {
-        if (!poAccessor->IsLevelValid(nLevel))
-            continue;
-        try
-        {
-            std::unique_ptr<IRasterReader> poLevel(poAccessor->CreateRasterReader(nLevel));
-            if (poLevel->GetWidth() >= nWidth && poLevel->GetHeight() >= nHeight)
-                return {std::move(poFull), std::move(poAccessor), std::move(poLevel)};
-        }
-        catch (const krv::Exception&)
-        {
-            krv::nspio::Warning::Warn(fmt::format("{}: level {} cannot be read: {}", moName, nLevel, CurrentMessage()));
-        }
-    }
-    return {std::move(poFull), nullptr, nullptr};
+    return LevelReader::AtLeast(ReadFull(oChannels), nWidth, nHeight, moName);
 }
 
 } // namespace krv::operations

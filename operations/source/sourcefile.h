@@ -31,10 +31,6 @@ KRV_OPERATIONS_API std::string WhyUnreadable(const std::string& file);
 // A channel's no-data value, when it has one.
 using OptionalNoData = std::optional<krv::datasources::NoDataValue>;
 
-// Whether a reference in metadata means a file: it names it as the user does, or as it lies beside the one that refers
-// to it.
-KRV_OPERATIONS_API bool IsReferenceTo(const std::string& reference, const std::string& file);
-
 // A reader and, for a level, what it stands on.
 class KRV_OPERATIONS_API LevelReader
 {
@@ -46,6 +42,11 @@ public:
     ~LevelReader();
 
     krv::datasources::IRasterReader& Get() const { return mpoLevel != nullptr ? *mpoLevel : *mpoFull; }
+
+    // The coarsest level of the reader that is not smaller than the wanted size, else the reader itself. A level that
+    // cannot be read is a warning, which names the file.
+    static LevelReader AtLeast(std::unique_ptr<krv::datasources::IRasterReader> poFull, unsigned int nWidth,
+                               unsigned int nHeight, const std::string& name);
 
 private:
     // In this order, so that the level's reader goes first.
@@ -98,7 +99,7 @@ public:
 
     // Channels of one type at full size (level 1) or at a level. Throws RequestException for a level that is not there.
     LevelReader Read(const std::vector<unsigned int>& oChannels, unsigned int nLevel = 1) const;
-    // The coarsest level that is not smaller than the wanted size; full size when there is none.
+    // The coarsest level that is not smaller than the wanted size (LevelReader::AtLeast).
     LevelReader ReadAtLeast(const std::vector<unsigned int>& oChannels, unsigned int nWidth,
                             unsigned int nHeight) const;
 

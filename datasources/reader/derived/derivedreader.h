@@ -48,6 +48,11 @@ protected:
     // Takes the source's size and its tile.
     void SetSource(OwnedOrBorrowed<IRasterReader> oSource);
     IRasterReader& GetSource() const { return **mpoSource; }
+    // Whether the source goes with this reader.
+    void OwnSource(bool bOwned) { mpoSource->get_deleter().mbOwned = bOwned; }
+    // For a derived class whose source stands on something that goes with the class: ends the source, or this reader's
+    // part in it, after which nothing may be called.
+    void DropSource() { mpoSource.reset(); }
 
     // How the reader of a level becomes one of this kind; holds nothing of this reader. None unless overridden.
     virtual LevelWrapper GetLevelWrapper() const;

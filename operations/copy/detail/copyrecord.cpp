@@ -104,7 +104,7 @@ void RenumberTables(MetadataMap& oMap, std::size_t nSource, const std::string& s
         if (oTag == oMap.end() || !krv::datasources::ParseRefMetadataTag(oTag->second, file, layer, nNumber))
             continue;
         const auto oTable = oTables.find({nSource, nNumber});
-        if (oTable == oTables.end() || !IsReferenceTo(file, source))
+        if (oTable == oTables.end() || !krv::datasources::IsReferenceTo(file, source))
             continue;
         const bool bBare = file.find('/') == std::string::npos;
         oTag->second = krv::datasources::BuildRefMetadataTag(

@@ -12,6 +12,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <filesystem>
 #include <memory>
@@ -166,6 +167,28 @@ TEST_F(ValiditySourceTest, PixelsOutsideTheImageAreValidOnlyAsCopies)
                         });
         }
     }
+}
+
+// A pixel of a level is valid by the bitmap where any pixel of its box is.
+TEST_F(ValiditySourceTest, LevelsAreValidWhereTheirBoxesAre)
+{
+    mpoModel->moBitmaps = {{1, ""}};
+    mpoModel->moLevels = {2};
+    const auto oBits = ReadBitmap(1, 0, eMirror);
+    const unsigned int nWidth = mpoModel->LevelWidth(2), nHeight = mpoModel->LevelHeight(2);
+    ValiditySource oSource(&moDataset, {}, nWidth, nHeight);
+    const Raster oRaster({nWidth, nHeight, 4, krv::gobs::eDT_8U}, {0, 0});
+    const auto oMask = Build(oSource, oRaster);
+    EXPECT_LT(oMask->CountSet(), std::uint64_t{nWidth} * nHeight);
+    ExpectValid(*oMask,
+                [&](std::uint64_t n)
+                {
+                    bool bAny = false;
+                    for (std::uint64_t y = n / nWidth * 2; y < std::min(n / nWidth * 2 + 2, std::uint64_t{17}); ++y)
+                        for (std::uint64_t x = n % nWidth * 2; x < std::min(n % nWidth * 2 + 2, std::uint64_t{21}); ++x)
+                            bAny = bAny || oBits->GetBuffer()[y * 21 + x] != 0;
+                    return bAny;
+                });
 }
 
 TEST_F(ValiditySourceTest, RefusesWhatItCannotAsk)

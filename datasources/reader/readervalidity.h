@@ -1,0 +1,49 @@
+#pragma once
+
+#include "datasources/api.h"
+#include "gobs/mask/maskdecision.h"
+
+#include <memory>
+
+namespace krv::gobs
+{
+class Mask;
+class Raster;
+} // namespace krv::gobs
+
+namespace krv::datasources
+{
+
+class IRasterReader;
+class IValidityReader;
+class ValiditySource;
+
+// Reads the rasters of any reader with the validity of their pixels: by the reader's own word when it has
+// IValidityReader, else by all that the dataset behind it says (ValiditySource), of a level too, else by its record
+// alone. One thread at a time.
+class KRV_DATASOURCES_API ReaderValidity
+{
+public:
+    // The reader is borrowed and outlives this. The rule counts where no-data values of channels decide. Throws what
+    // ValiditySource throws.
+    explicit ReaderValidity(IRasterReader& oReader, krv::gobs::BkgdRule eRule = krv::gobs::eAllChannels);
+    ~ReaderValidity();
+    ReaderValidity(const ReaderValidity&) = delete;
+    ReaderValidity& operator=(const ReaderValidity&) = delete;
+
+    // Whether any pixel of the image could be invalid.
+    bool IsNeeded() const { return mbNeeded; }
+    // Whether nothing but the values of the pixels themselves says so.
+    bool IsByValues() const;
+    // Fills the raster, and gives a new mask over its full extent whose set bits are valid pixels; null, which means
+    // all pixels of the image, when it is not needed.
+    std::unique_ptr<krv::gobs::Mask> Read(krv::gobs::Raster& oRaster);
+
+private:
+    IRasterReader& moReader;
+    IValidityReader* mpoFacet;                 // of the reader, or null
+    std::unique_ptr<ValiditySource> mpoSource; // where there is no facet
+    bool mbNeeded;
+};
+
+} // namespace krv::datasources
