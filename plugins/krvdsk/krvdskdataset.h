@@ -1,9 +1,11 @@
 #pragma once
 
 #include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/iephemerisdataset.h"
 #include "datasources/interfaces/ihistoryio.h"
 #include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/ilutdataset.h"
+#include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/interfaces/iverifieddataset.h"
@@ -32,6 +34,9 @@ class KrvdskDataset : public support::RecordDataset,
                       public krv::datasources::IBitmapDataset,
                       public krv::datasources::IPCTDataset,
                       public krv::datasources::ILUTDataset,
+                      public krv::datasources::IMathModelDataset,
+                      public krv::datasources::IEphemerisDataset,
+                      public krv::datasources::IEphemerisRecords,
                       public krv::datasources::ILinkedDataset,
                       public krv::datasources::IStorageDataset,
                       public krv::datasources::IVerifiedDataset
@@ -85,6 +90,21 @@ public:
     void UpdateLUT(unsigned int nLUT, const krv::datasources::LookupTable& oTable) override;
     void SetLUTDescription(unsigned int nLUT, const std::string& oDescription) override;
     void DeleteLUT(unsigned int nLUT) override;
+
+    bool HasMathModel() const override { return !GetMathModelList().empty(); }
+    std::vector<unsigned int> GetMathModelList() const override;
+    krv::mathmodel::IMathModel* GetMathModel(unsigned int nSegment) override;
+    // Throws DataException for any other than a rational polynomial one.
+    unsigned int CreateMathModel(const krv::mathmodel::IMathModel& oModel) override;
+    void DeleteMathModel(unsigned int nSegment) override;
+
+    int HasEphemeris() const override { return GetEphemerisList().empty() ? 0 : 1; }
+    std::vector<unsigned int> GetEphemerisList() const override;
+    void DeleteEphemeris(unsigned int nSegment) override;
+    // Of the linked file's orbits alone: what kinds there are and how models come from them is not known here.
+    krv::mathmodel::IMathModel* BuildMathModel(unsigned int nEphemeris, unsigned int nSegment) override;
+    unsigned int CreateEphemeris(const std::string& kind, const std::vector<unsigned char>& oRecords) override;
+    krv::datasources::EphemerisRecords ReadEphemeris(unsigned int nSegment) const override;
 
     std::optional<std::uint64_t> GetUnusedBytes() override;
     std::vector<std::string> Verify(const Progress& oProgress) override;

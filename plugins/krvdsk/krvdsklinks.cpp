@@ -10,7 +10,9 @@ namespace krv::plugins::krvdsk
 {
 
 using krv::datasources::IBitmapDataset;
+using krv::datasources::IEphemerisDataset;
 using krv::datasources::ILUTDataset;
+using krv::datasources::IMathModelDataset;
 using krv::datasources::IOverviewManager;
 using krv::datasources::IPCTDataset;
 using krv::datasources::IRasterDataset;
@@ -51,7 +53,8 @@ void KrvdskDataset::LinkChannels(Catalogue& oCatalogue, const std::vector<krv::g
         Refuse("the types are not those of the channels of more than one bit of " + oLink.GetName(), oPlace);
     for (const unsigned int nLast :
          {LastNumber(oLink, &IBitmapDataset::GetBitmapList), LastNumber(oLink, &IPCTDataset::GetPCTList),
-          LastNumber(oLink, &ILUTDataset::GetLUTList)})
+          LastNumber(oLink, &ILUTDataset::GetLUTList), LastNumber(oLink, &IMathModelDataset::GetMathModelList),
+          LastNumber(oLink, &IEphemerisDataset::GetEphemerisList)})
         oCatalogue.mnNextSegment = std::max(oCatalogue.mnNextSegment, std::min(nLast, UINT32_MAX - 1) + 1);
 }
 

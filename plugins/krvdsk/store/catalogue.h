@@ -77,6 +77,7 @@ struct Segment
     static constexpr const char* BITMAP = "BITMAP";
     static constexpr const char* PCT = "PCT";
     static constexpr const char* LUT = "LUT";
+    static constexpr const char* MODEL = "MODEL";
     static constexpr const char* EPHEMERIS = "EPHEMERIS";
 
     std::string moKind;
