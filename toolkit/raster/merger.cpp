@@ -207,32 +207,46 @@ void Merger::Plan::MakeVectors()
     }
 }
 
-// Each load begins at the first byte that is still missing; bytes that one load gives lie no more than a vector apart.
+// Bytes that one load gives lie no more than a load apart. Loads begin at multiples of their length where that takes no
+// more of them, since a load across two lines of the cache costs two; otherwise at the first byte that is still
+// missing.
 void Merger::Plan::AddTerms(std::size_t nVector, std::size_t nStream)
 {
+    constexpr std::size_t NOWHERE = std::numeric_limits<std::size_t>::max();
     const std::size_t nPartBytes = detail::PART_BYTES[mnMeeting];
     std::size_t oFrom[MAX_VECTOR]; // for each byte its place in the stream
-    std::size_t nFirst = 0;
     for (std::size_t nByte = 0; nByte < mnVector; ++nByte)
     {
         const std::size_t nAt = nVector * mnVector + nByte;
         const Part& oPart = moParts[nAt % mnMergedBytes / nPartBytes];
         const bool bMine = oPart.mnStream == nStream && nAt % nPartBytes < oPart.mnBytes;
-        oFrom[nByte] = bMine ? nAt / mnMergedBytes * moStreams[nStream].mnBytes + oPart.mnOffset + nAt % nPartBytes
-                             : std::numeric_limits<std::size_t>::max();
+        oFrom[nByte] =
+            bMine ? nAt / mnMergedBytes * moStreams[nStream].mnBytes + oPart.mnOffset + nAt % nPartBytes : NOWHERE;
     }
-    while ((nFirst = *std::min_element(oFrom, oFrom + mnVector)) != std::numeric_limits<std::size_t>::max())
+    const auto MakeTerms = [&](bool bAligned)
     {
-        Term oTerm = {nStream, nFirst, {}};
-        for (std::size_t nByte = 0; nByte < mnVector; ++nByte)
+        std::vector<Term> oTerms;
+        std::size_t oLeft[MAX_VECTOR];
+        std::copy_n(oFrom, mnVector, oLeft);
+        for (std::size_t nFirst = 0; (nFirst = *std::min_element(oLeft, oLeft + mnVector)) != NOWHERE;)
         {
-            const bool bInside = oFrom[nByte] - nFirst < mnLoad;
-            oTerm.moShuffle[nByte] = bInside ? static_cast<unsigned char>(oFrom[nByte] - nFirst) : 0x80;
-            if (bInside)
-                oFrom[nByte] = std::numeric_limits<std::size_t>::max();
+            const std::size_t nBegin = bAligned ? nFirst / mnLoad * mnLoad : nFirst;
+            Term oTerm = {nStream, nBegin, {}};
+            for (std::size_t nByte = 0; nByte < mnVector; ++nByte)
+            {
+                const bool bInside = oLeft[nByte] - nBegin < mnLoad;
+                oTerm.moShuffle[nByte] = bInside ? static_cast<unsigned char>(oLeft[nByte] - nBegin) : 0x80;
+                if (bInside)
+                    oLeft[nByte] = NOWHERE;
+            }
+            oTerms.push_back(oTerm);
         }
-        moTerms.push_back(oTerm);
-    }
+        return oTerms;
+    };
+    const std::vector<Term> oAligned = MakeTerms(true);
+    const std::vector<Term> oEarliest = MakeTerms(false);
+    const std::vector<Term>& oTerms = oAligned.size() <= oEarliest.size() ? oAligned : oEarliest;
+    moTerms.insert(moTerms.end(), oTerms.begin(), oTerms.end());
 }
 
 void Merger::Plan::MakeScratch()

@@ -391,6 +391,8 @@ TEST(MetaComplexDataset, TheScenePutTogetherIsTheScene)
     const std::string file = DataFolder() + "/sar/slc.tif";
     if (!std::filesystem::exists(file))
         GTEST_SKIP() << "no real files";
+    FormatHome oHome;
+    oHome.Add(std::string(KRV_TEST_HOME) + "/lib/qrfformats/tif.so");
     BasicReader oScene(file);
     const std::string pixels = ReadPixels(oScene);
     const auto oValues = ValuesOf<std::int16_t>(pixels);
