@@ -16,24 +16,8 @@
 namespace krv::plugins::support
 {
 
-namespace
-{
-
-std::uint64_t ThreeBlockRows(const ImageLayout& oLayout)
-{
-    std::uint64_t nPixelBytes = 0;
-    for (unsigned int nPlane = 0; nPlane < oLayout.GetPlaneCount(); ++nPlane)
-        nPixelBytes += oLayout.GetPixelBytes(nPlane);
-    const std::uint64_t nRowPixels = std::uint64_t{oLayout.GetWidth()} * oLayout.GetBlockHeight();
-    if (nRowPixels > BlockCache::MAXIMUM_BOUND || nPixelBytes > BlockCache::MAXIMUM_BOUND)
-        return BlockCache::MAXIMUM_BOUND;
-    return 3 * nRowPixels * nPixelBytes;
-}
-
-} // namespace
-
 Dataset::Dataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat)
-    : moName(fileName), mpoFormat(poFormat), mpoCache(std::make_shared<BlockCache>())
+    : moName(fileName), mpoFormat(poFormat), mpoCache(std::make_shared<BlockCache>(BlockCache::Sharing::eByOrigin))
 {
 }
 
@@ -41,6 +25,7 @@ Dataset::Dataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<FileWr
     : Dataset(poWriter->GetFileName(), poFormat)
 {
     mpoWriter = std::move(poWriter);
+    mpoCache = std::make_shared<BlockCache>();
 }
 
 Dataset::~Dataset()
@@ -50,7 +35,6 @@ Dataset::~Dataset()
 
 void Dataset::SetImage(std::shared_ptr<IBlockSource> poSource)
 {
-    mpoCache->Reserve(ThreeBlockRows(poSource->GetLayout()));
     mpoImage = std::make_shared<BlockImage>(std::move(poSource), mpoCache);
 }
 

@@ -83,13 +83,13 @@ protected:
     // Throws DataException unless the image of a new file is to be laid out, and can be. bEmpty: without channels too.
     void CheckCreate(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes,
                      const Place& oPlace, bool bEmpty = false) const;
-    // Makes the source the dataset's image and bounds the cache: three rows of its blocks, at least 64 MiB, at most
-    // 256.
+    // Makes the source the dataset's image.
     void SetImage(std::shared_ptr<IBlockSource> poSource);
     bool HasImage() const { return mpoImage != nullptr; }
     // Throws DataException when closed or without an image.
     const std::shared_ptr<BlockImage>& GetImage(const Place& oPlace = Place::Current()) const;
     const ImageLayout& GetLayout(const Place& oPlace = Place::Current()) const;
+    // For further images of the dataset: levels, bitmaps.
     const std::shared_ptr<BlockCache>& GetCache() const { return mpoCache; }
     void CheckOpen(const Place& oPlace = Place::Current()) const;
     // Throws the DataException of an operation that the format lacks. what: such as "channels cannot be deleted".

@@ -32,7 +32,7 @@ std::int64_t Nanoseconds(const timespec& oTime)
 
 } // namespace
 
-// The generation first: a change between the two shows in the next stamp.
+// The generation last: whoever has it reads all that was written before it.
 std::optional<FileStamp> FileStamp::Read(int nDescriptor)
 {
     struct stat oStatus = {};
@@ -41,12 +41,10 @@ std::optional<FileStamp> FileStamp::Read(int nDescriptor)
     FileStamp oStamp;
     oStamp.mnDevice = oStatus.st_dev;
     oStamp.mnInode = oStatus.st_ino;
-    oStamp.mnGeneration = FindGeneration(oStamp.mnDevice, oStamp.mnInode).load();
-    if (::fstat(nDescriptor, &oStatus) != 0)
-        return std::nullopt;
     oStamp.mnSize = static_cast<std::uint64_t>(oStatus.st_size);
     oStamp.mnChanged = Nanoseconds(oStatus.st_ctim);
     oStamp.mnModified = Nanoseconds(oStatus.st_mtim);
+    oStamp.mnGeneration = FindGeneration(oStamp.mnDevice, oStamp.mnInode).load();
     return oStamp;
 }
 

@@ -184,7 +184,8 @@ struct TileLook
 };
 
 // Somebody's tiles in a store. Owners with the same identity have the same tiles: what one of them made the others
-// find. When the last of them goes its tiles go too; so do holds and claims before.
+// find. When the last of them goes its tiles go too; claims go before, holds may go after. Any number of
+// threads may use one.
 class KRV_TOOLKIT_API TileOwner
 {
 public:

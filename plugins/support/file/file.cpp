@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <chrono>
 #include <cstdio>
 #include <cstring>
 
@@ -23,6 +24,10 @@ namespace
 constexpr std::size_t SLICE_BYTES = 256 * 1024;
 // A call to the system costs about as much as copying this many bytes.
 constexpr std::size_t CALL_BYTES = 4096;
+
+// Reading so many bytes or more that takes longer than this waits for a disk or a network.
+constexpr std::size_t TIMED_BYTES = 16 * 1024;
+constexpr std::chrono::microseconds SLOW_READ{1500};
 
 // Locks on bytes from here on stand for the roots of states; no file reaches so far.
 constexpr std::uint64_t FIRST_ROOT = std::uint64_t{1} << 62;
@@ -129,6 +134,20 @@ void ThrowNameTaken(const std::string& fileName, const Place& oPlace)
     throw IOException(fileName, fileName + ": there is a file of that name meanwhile, which is not replaced", oPlace);
 }
 
+class File::Change
+{
+public:
+    explicit Change(const File& oFile) : moFile(oFile) { Note(); }
+    ~Change() { Note(); }
+    Change(const Change&) = delete;
+    Change& operator=(const Change&) = delete;
+
+private:
+    void Note() const { krv::cache::FileStamp::NoteChange(moFile.mnDevice, moFile.mnInode); }
+
+    const File& moFile;
+};
+
 File::File(const std::string& fileName, Mode eMode, const Place& oPlace) : moName(fileName), moPath(fileName)
 {
     mnDescriptor = ::open(fileName.c_str(), OpenFlags(eMode), 0666);
@@ -152,7 +171,13 @@ File::File(const std::string& fileName, Mode eMode, const Place& oPlace) : moNam
     if (eMode != Mode::eRead && ::fstat(mnDescriptor, &oStatus) != 0)
         oStatus.st_size = 0;
     mnSize = static_cast<std::uint64_t>(oStatus.st_size);
+    mnDevice = oStatus.st_dev;
+    mnInode = oStatus.st_ino;
     mbLinked = oStatus.st_nlink != 0;
+    if (eMode != Mode::eRead)
+        const Change oOpened(*this);
+    else if (const auto oStamp = krv::cache::FileStamp::Read(mnDescriptor); oStamp && oStamp->IsSettled())
+        moStamp = oStamp;
 }
 
 File::~File()
@@ -160,10 +185,25 @@ File::~File()
     ::close(mnDescriptor);
 }
 
+bool File::IsAsOpened() const
+{
+    return moStamp && krv::cache::FileStamp::Read(mnDescriptor) == moStamp;
+}
+
+void File::Foresee(std::uint64_t nOffset, std::uint64_t nBytes) const noexcept
+{
+    if (nOffset < mnSize)
+        ::posix_fadvise(mnDescriptor, static_cast<off_t>(nOffset),
+                        static_cast<off_t>(std::min(nBytes, mnSize - nOffset)), POSIX_FADV_WILLNEED);
+}
+
 std::size_t File::ReadUpTo(std::uint64_t nOffset, void* pTarget, std::size_t nBytes, Location oLocation) const
 {
+    using Clock = std::chrono::steady_clock;
     auto* pBytes = static_cast<unsigned char*>(pTarget);
     std::size_t nDone = 0;
+    const bool bTimed = nBytes >= TIMED_BYTES;
+    const Clock::time_point oBegin = bTimed ? Clock::now() : Clock::time_point();
     while (nDone < nBytes)
     {
         const auto nAt = nOffset + nDone;
@@ -178,6 +218,9 @@ std::size_t File::ReadUpTo(std::uint64_t nOffset, void* pTarget, std::size_t nBy
             throw IOException(moName, moName + ": reading failed: " + SystemErrorText(errno),
                               Place::Current(oLocation));
     }
+    if (bTimed)
+        mbSlow.store(Clock::now() - oBegin > SLOW_READ * (1 + nDone / (std::size_t{1} << 20)),
+                     std::memory_order_relaxed);
     return nDone;
 }
 
@@ -218,6 +261,7 @@ void File::ReadRows(std::uint64_t nOffset, std::size_t nStoredPitch, std::size_t
 
 void File::Write(std::uint64_t nOffset, const void* pSource, std::size_t nBytes, Location oLocation)
 {
+    const Change oChange(*this);
     const auto* pBytes = static_cast<const unsigned char*>(pSource);
     for (std::size_t nDone = 0; nDone < nBytes;)
     {
@@ -258,6 +302,7 @@ void File::CutBack(std::uint64_t nBytes) noexcept
     if (nBytes >= mnSize || ::fstat(mnDescriptor, &oStatus) != 0 ||
         static_cast<std::uint64_t>(oStatus.st_size) != mnSize)
         return;
+    const Change oChange(*this);
     if (::ftruncate(mnDescriptor, static_cast<off_t>(nBytes)) == 0)
         mnSize = nBytes;
 }
@@ -299,6 +344,7 @@ bool File::CanSeeLocks() const
 
 void File::EndWriting() noexcept
 {
+    const Change oChange(*this);
     ::flock(mnDescriptor, LOCK_UN);
 }
 

@@ -1,8 +1,10 @@
 #pragma once
 
 #include "plugins/support/file/scratch.h"
+#include "toolkit/cache/filestamp.h"
 #include "toolkit/exceptions/place.h"
 
+#include <atomic>
 #include <cstddef>
 #include <cstdint>
 #include <optional>
@@ -41,6 +43,12 @@ public:
     // The size at the moment of opening; writing beyond the end raises it.
     std::uint64_t GetSize() const { return mnSize; }
 
+    // What the file was when it was opened for reading; nothing when others that open it may not go by that: it is
+    // written here, or was changed less than two seconds before.
+    const std::optional<krv::cache::FileStamp>& GetStamp() const { return moStamp; }
+    // Whether it is still that.
+    bool IsAsOpened() const;
+
     // Reads exactly nBytes. Throws IOException when the file ends before.
     void Read(std::uint64_t nOffset, void* pTarget, std::size_t nBytes, Location oLocation = Location::current()) const;
 
@@ -58,6 +66,11 @@ public:
                Location oLocation = Location::current());
     void WriteRows(std::uint64_t nOffset, std::size_t nStoredPitch, std::size_t nRowBytes, std::size_t nRows,
                    const unsigned char* pSource, std::size_t nPitch, Location oLocation = Location::current());
+
+    // Whether reading waits for a disk or a network, as far as the last transfer of some size tells.
+    bool IsSlow() const { return mbSlow.load(std::memory_order_relaxed); }
+    // Tells the system what will be read soon: it may fetch it meanwhile.
+    void Foresee(std::uint64_t nOffset, std::uint64_t nBytes) const noexcept;
 
     // Makes sure that what was written reaches the disk. Throws when the file lost its name meanwhile: nobody would
     // find it again.
@@ -85,12 +98,19 @@ public:
     void Rename(const std::string& fileName, bool bReplace, const Place& oPlace = Place::Current());
 
 private:
+    // Tells the process of a change, before and after.
+    class Change;
+
     bool CanSeeLocks() const;
 
     std::string moName;
     std::string moPath;
     int mnDescriptor = -1;
     std::uint64_t mnSize = 0;
+    std::uint64_t mnDevice = 0;
+    std::uint64_t mnInode = 0;
+    std::optional<krv::cache::FileStamp> moStamp;
+    mutable std::atomic<bool> mbSlow{false};
     bool mbLinked = false; // some file systems do not count names
     std::optional<std::uint64_t> moHeld;
     mutable std::optional<bool> moSeesLocks;

@@ -16,14 +16,17 @@ namespace
 constexpr std::size_t SLICE_BYTES = 256 * 1024;
 // So many bytes of planes are decoded beside each other before they are interleaved in one pass.
 constexpr std::size_t PLANES_BYTES = std::size_t{32} << 20;
+// The same of planes that lie in the store.
+constexpr std::size_t MOST_PLANES_BYTES = std::size_t{256} << 20;
 // Memory that stays with an image between windows.
 constexpr std::size_t KEPT_SCRATCH_BYTES = std::size_t{4} << 20;
-constexpr std::size_t ROW_CACHE_BYTES = std::size_t{64} << 10;
 constexpr std::uint64_t LARGEST_KEPT_PART = std::uint64_t{16} << 20;
 // Three blocks above a window and three below, and the two that are about to go.
 constexpr std::uint64_t THIN_ENTRIES = 8;
 constexpr int SHARING_LIMIT = 6;
 constexpr int SHARING_THRESHOLD = 2;
+// So many blocks are foreseen together.
+constexpr unsigned int FORESEEN_BLOCKS = 8;
 
 bool Inside(const PixelRect& oInner, const PixelRect& oOuter)
 {
@@ -92,11 +95,21 @@ struct BlockImage::Range
     }
 };
 
-// Decoded pixels of one plane: pointer to the first one of a part, and the bytes from row to row.
+// Decoded pixels of one plane: pointer to the first one of a part, and the bytes from row to row; where they lie in the
+// store, with the hold on them. Of a block that another thread is decoding there are none.
 struct BlockImage::Pixels
 {
     const unsigned char* mpFirst = nullptr;
     std::size_t mnPitch = 0;
+    bool mbComing = false;
+    krv::cache::TileHold moHold;
+
+    Pixels() = default;
+    Pixels(const unsigned char* pFirst, std::size_t nPitch) : mpFirst(pFirst), mnPitch(nPitch) {}
+    explicit Pixels(krv::cache::TileHold oHold)
+        : mpFirst(oHold.GetFirst()), mnPitch(oHold.GetPitch()), moHold(std::move(oHold))
+    {
+    }
 };
 
 // One window on its way.
@@ -111,8 +124,8 @@ struct BlockImage::Job
     std::size_t mnPitch;
 };
 
-BlockImage::BlockImage(std::shared_ptr<IBlockSource> poSource, std::shared_ptr<BlockCache> poCache)
-    : mpoSource(std::move(poSource)), moLayout(mpoSource->GetLayout()), mpoCache(std::move(poCache)),
+BlockImage::BlockImage(std::shared_ptr<IBlockSource> poSource, const std::shared_ptr<BlockCache>& poCache)
+    : mpoSource(std::move(poSource)), moLayout(mpoSource->GetLayout()), moTiles(*mpoSource, *poCache), moPass(moLayout),
       mbParts(mpoSource->ReadsParts())
 {
     mbSmallBlocks =
@@ -120,20 +133,17 @@ BlockImage::BlockImage(std::shared_ptr<IBlockSource> poSource, std::shared_ptr<B
                                              LARGEST_KEPT_PART / moLayout.GetPixelBytes(0);
     if (mbParts)
     {
-        mpoRowCache = std::make_unique<BlockCache>(ROW_CACHE_BYTES);
-        mpoThinCache = std::make_unique<BlockCache>(ROW_CACHE_BYTES);
+        mpoRowCache = std::make_unique<RowCache>();
+        mpoThinCache = std::make_unique<RowCache>();
     }
 }
 
-BlockImage::~BlockImage()
-{
-    DropBlocks();
-}
+BlockImage::~BlockImage() = default;
 
 void BlockImage::DropBlocks()
 {
-    mpoCache->DropImage(this);
-    if (mpoRowCache)
+    moTiles.DropAll();
+    if (mbParts)
     {
         mpoRowCache->Clear();
         mpoThinCache->Clear();
@@ -163,10 +173,28 @@ void BlockImage::Read(const ChannelSelection& oChannels, const PixelRect& oRect,
     const Job oJob{oChannels, oRect, oRange, bAligned, mnSharing >= SHARING_THRESHOLD, pTarget, nPitch};
     if (mbParts && oJob.mbSharing)
         ReserveRowCache(oJob);
+    if (!mbParts && !bAligned)
+        NotePass(oJob);
+    moLater.clear();
     for (unsigned int nRow = oRange.mnTop; nRow <= oRange.mnBottom; ++nRow)
         for (unsigned int nColumn = oRange.mnLeft; nColumn <= oRange.mnRight; ++nColumn)
-            ReadPart(oJob, nColumn, nRow);
+            if (!ReadPart(oJob, nColumn, nRow, Wait::eNo))
+                moLater.emplace_back(nColumn, nRow);
+    for (const auto& [nColumn, nRow] : moLater)
+        static_cast<void>(ReadPart(oJob, nColumn, nRow, Wait::eYes));
     moScratch.Shrink(KEPT_SCRATCH_BYTES);
+}
+
+void BlockImage::NotePass(const Job& oJob)
+{
+    const std::vector<ChannelPlace>& oPlaces = oJob.moChannels.GetPlaces();
+    const auto Done = [this, &oPlaces](unsigned int nColumn, unsigned int nRow, unsigned int nRows)
+    {
+        for (std::size_t nAt = 0; nAt < oPlaces.size(); ++nAt)
+            if (nAt == 0 || oPlaces[nAt].mnPlane != oPlaces[nAt - 1].mnPlane)
+                moTiles.Retire({oPlaces[nAt].mnPlane, nColumn, nRow}, nRows);
+    };
+    moPass.Note(oJob.moRect, Done);
 }
 
 // Room for just the blocks that ChooseKeep keeps of one window: the next one wants no others, and few blocks stay
@@ -179,7 +207,7 @@ void BlockImage::ReserveRowCache(const Job& oJob)
     const std::uint64_t nBlockBytes = std::uint64_t{moLayout.GetBlockWidth()} * moLayout.GetBlockHeight() *
                                       moLayout.GetPixelBytes(oJob.moChannels.GetPlaces().front().mnPlane);
     const std::uint64_t nPlanes = oJob.moChannels.IsOnePlane() ? 1 : oJob.moChannels.GetCount();
-    if (nBlockBytes <= LARGEST_KEPT_PART && nBlocks * nPlanes <= BlockCache::MINIMUM_BOUND / nBlockBytes)
+    if (nBlockBytes <= LARGEST_KEPT_PART && nBlocks * nPlanes <= RowCache::MOST_BOUND / nBlockBytes)
         mpoRowCache->Reserve(nBlocks * nPlanes * nBlockBytes);
 }
 
@@ -221,7 +249,7 @@ BlockImage::Keep BlockImage::ChooseKeep(const Job& oJob, unsigned int nColumn, u
     return !bWhole || (bNearEdge && !oJob.mbAligned) || bFurtherChannels ? Keep::eBlock : Keep::eNothing;
 }
 
-void BlockImage::ReadPart(const Job& oJob, unsigned int nColumn, unsigned int nRow)
+bool BlockImage::ReadPart(const Job& oJob, unsigned int nColumn, unsigned int nRow, Wait eWait)
 {
     const PixelRect oBlock = moLayout.GetBlockRect(nColumn, nRow);
     PixelRect oPart = Intersect(oBlock, oJob.moRect);
@@ -231,19 +259,16 @@ void BlockImage::ReadPart(const Job& oJob, unsigned int nColumn, unsigned int nR
     oPart.mnY -= oBlock.mnY;
     const Keep eKeep = ChooseKeep(oJob, nColumn, nRow, oPart);
     const BlockAddress oAddress{oJob.moChannels.GetPlaces().front().mnPlane, nColumn, nRow};
-    if (oJob.moChannels.IsOnePlane())
-        ReadOnePlane(oJob, oAddress, oPart, eKeep, pTarget);
-    else
-        ReadPlanes(oJob, oAddress, oPart, eKeep, pTarget);
+    return oJob.moChannels.IsOnePlane() ? ReadOnePlane(oJob, oAddress, oPart, eKeep, pTarget, eWait)
+                                        : ReadPlanes(oJob, oAddress, oPart, eKeep, pTarget, eWait);
 }
 
 BlockImage::Pixels BlockImage::FindBlock(const BlockAddress& oBlock, const PixelRect& oPart)
 {
-    BlockCache& oCache = GetCache();
-    if (oCache.GetBytes() == 0)
-        return {};
+    if (!mbParts)
+        return Pixels(moTiles.Find(oBlock, oPart));
     const unsigned char* pBlock =
-        oCache.Find({this, oBlock.mnPlane, moLayout.GetBlockIndex(oBlock.mnColumn, oBlock.mnRow)});
+        mpoRowCache->Find({oBlock.mnPlane, moLayout.GetBlockIndex(oBlock.mnColumn, oBlock.mnRow)});
     if (pBlock == nullptr)
         return {};
     const std::size_t nPixelBytes = moLayout.GetPixelBytes(oBlock.mnPlane);
@@ -251,22 +276,56 @@ BlockImage::Pixels BlockImage::FindBlock(const BlockAddress& oBlock, const Pixel
     return {pBlock + oPart.mnY * nPitch + oPart.mnX * nPixelBytes, nPitch};
 }
 
-BlockImage::Pixels BlockImage::LoadBlock(const BlockAddress& oBlock, const PixelRect& oPart)
+BlockImage::Pixels BlockImage::LoadPlainBlock(const BlockAddress& oBlock, const PixelRect& oPart)
 {
+    if (Pixels oFound = FindBlock(oBlock, oPart); oFound.mpFirst != nullptr)
+        return oFound;
     const PixelRect oRect = moLayout.GetBlockRect(oBlock.mnColumn, oBlock.mnRow);
     const std::size_t nPitch = oRect.mnWidth * moLayout.GetPixelBytes(oBlock.mnPlane);
-    const BlockCache::Key oKey{this, oBlock.mnPlane, moLayout.GetBlockIndex(oBlock.mnColumn, oBlock.mnRow)};
-    unsigned char* pBlock = GetCache().Add(oKey, nPitch * oRect.mnHeight);
-    FillEntry(GetCache(), oKey, oBlock, {0, 0, oRect.mnWidth, oRect.mnHeight}, pBlock);
+    const RowCache::Key oKey{oBlock.mnPlane, moLayout.GetBlockIndex(oBlock.mnColumn, oBlock.mnRow)};
+    FillEntry(*mpoRowCache, oKey, oBlock, {0, 0, oRect.mnWidth, oRect.mnHeight},
+              mpoRowCache->Add(oKey, nPitch * oRect.mnHeight));
     return FindBlock(oBlock, oPart);
 }
 
+BlockImage::Pixels BlockImage::LoadBlock(const BlockAddress& oBlock, const PixelRect& oPart, unsigned int nFollowing,
+                                         Wait eWait)
+{
+    if (mbParts)
+        return LoadPlainBlock(oBlock, oPart);
+    Pixels oPixels(moTiles.Load(oBlock, oPart, moPass.GetBorder(), eWait, [&] { Announce(oBlock, nFollowing); }));
+    oPixels.mbComing = oPixels.mpFirst == nullptr;
+    return oPixels;
+}
+
+// What lies beside a block that is about to be read, as far as the window has it, and what the next windows want.
+void BlockImage::Announce(const BlockAddress& oBlock, unsigned int nFollowing)
+{
+    if (nFollowing != 0)
+        mpoSource->Expect(oBlock, nFollowing + 1);
+    if (!moPass.IsPassing())
+        return;
+    BlockAddress oNext{oBlock.mnPlane, oBlock.mnColumn + nFollowing + 1, oBlock.mnRow};
+    const unsigned int nAcross = moLayout.GetBlocksAcross();
+    const bool bNextRow = oNext.mnColumn >= nAcross;
+    if (bNextRow && (nAcross > 1 || oNext.mnRow + 1 >= moLayout.GetBlocksDown()))
+        return;
+    if (bNextRow)
+        oNext = {oNext.mnPlane, 0, oNext.mnRow + 1};
+    if (oNext.mnPlane == moForeseen.mnPlane && oNext.mnRow == moForeseen.mnRow && oNext.mnColumn < moForeseen.mnColumn)
+        return;
+    const unsigned int nBlocks = std::min(FORESEEN_BLOCKS, nAcross - oNext.mnColumn);
+    moForeseen = {oNext.mnPlane, oNext.mnColumn + nBlocks, oNext.mnRow};
+    mpoSource->Foresee(oNext, nBlocks);
+}
+
 // Nothing when the block is damaged and the part of it may be read for itself.
-BlockImage::Pixels BlockImage::TryLoad(const BlockAddress& oBlock, const PixelRect& oPart)
+BlockImage::Pixels BlockImage::TryLoad(const BlockAddress& oBlock, const PixelRect& oPart, unsigned int nFollowing,
+                                       Wait eWait)
 {
     try
     {
-        return LoadBlock(oBlock, oPart);
+        return LoadBlock(oBlock, oPart, nFollowing, eWait);
     }
     catch (const krv::FileException&)
     {
@@ -282,8 +341,8 @@ BlockImage::Pixels BlockImage::GetRows(const BlockAddress& oBlock, const PixelRe
     const PixelRect oRect = moLayout.GetBlockRect(oBlock.mnColumn, oBlock.mnRow);
     const std::size_t nPixelBytes = moLayout.GetPixelBytes(oBlock.mnPlane);
     const std::size_t nPitch = oRect.mnWidth * nPixelBytes;
-    const BlockCache::Key oKey{this, oBlock.mnPlane, moLayout.GetBlockIndex(oBlock.mnColumn, oBlock.mnRow), oPart.mnY,
-                               oPart.mnHeight};
+    const RowCache::Key oKey{oBlock.mnPlane, moLayout.GetBlockIndex(oBlock.mnColumn, oBlock.mnRow), oPart.mnY,
+                             oPart.mnHeight};
     unsigned char* pRows = mpoThinCache->Find(oKey);
     if (pRows == nullptr)
     {
@@ -294,7 +353,7 @@ BlockImage::Pixels BlockImage::GetRows(const BlockAddress& oBlock, const PixelRe
     return {pRows + oPart.mnX * nPixelBytes, nPitch};
 }
 
-void BlockImage::FillEntry(BlockCache& oCache, const BlockCache::Key& oKey, const BlockAddress& oBlock,
+void BlockImage::FillEntry(RowCache& oCache, const RowCache::Key& oKey, const BlockAddress& oBlock,
                            const PixelRect& oPart, unsigned char* pTarget)
 {
     try
@@ -308,35 +367,48 @@ void BlockImage::FillEntry(BlockCache& oCache, const BlockCache::Key& oKey, cons
     }
 }
 
-BlockImage::Pixels BlockImage::ObtainPart(const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
-                                          Scratch& oScratch)
+// What is there already, or is to be kept from now on.
+BlockImage::Pixels BlockImage::ObtainKept(const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
+                                          unsigned int nFollowing, Wait eWait)
 {
-    const Pixels oCached = FindBlock(oBlock, oPart);
-    if (oCached.mpFirst != nullptr)
-        return oCached;
-    if (eKeep == Keep::eRows)
-        return GetRows(oBlock, oPart);
-    if (const Pixels oLoaded = eKeep == Keep::eBlock ? TryLoad(oBlock, oPart) : Pixels(); oLoaded.mpFirst != nullptr)
-        return oLoaded;
+    if (eKeep == Keep::eBlock)
+        return TryLoad(oBlock, oPart, nFollowing, eWait);
+    Pixels oFound = FindBlock(oBlock, oPart);
+    return oFound.mpFirst == nullptr && eKeep == Keep::eRows ? GetRows(oBlock, oPart) : std::move(oFound);
+}
+
+BlockImage::Pixels BlockImage::ObtainPart(const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
+                                          Scratch& oScratch, unsigned int nFollowing, Wait eWait)
+{
+    Pixels oKept = ObtainKept(oBlock, oPart, eKeep, nFollowing, eWait);
+    if (oKept.mpFirst != nullptr || oKept.mbComing)
+        return oKept;
     const std::size_t nPitch = oPart.mnWidth * moLayout.GetPixelBytes(oBlock.mnPlane);
     unsigned char* pScratch = oScratch.Get(nPitch * oPart.mnHeight);
     mpoSource->ReadBlock(oBlock, oPart, pScratch, nPitch);
     return {pScratch, nPitch};
 }
 
-void BlockImage::ReadOnePlane(const Job& oJob, const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
-                              unsigned char* pTarget)
+bool BlockImage::ReadOnePlane(const Job& oJob, const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
+                              unsigned char* pTarget, Wait eWait)
 {
     const std::size_t nPixelBytes = moLayout.GetPixelBytes(oBlock.mnPlane);
+    const unsigned int nFollowing = oJob.moRange.mnRight - oBlock.mnColumn;
     if (oJob.moChannels.IsWholePlane())
     {
-        Pixels oPixels = FindBlock(oBlock, oPart);
-        if (oPixels.mpFirst == nullptr && eKeep != Keep::eNothing)
-            oPixels = eKeep == Keep::eBlock ? TryLoad(oBlock, oPart) : GetRows(oBlock, oPart);
+        const Pixels oPixels = ObtainKept(oBlock, oPart, eKeep, nFollowing, eWait);
+        if (oPixels.mbComing)
+            return false;
         if (oPixels.mpFirst == nullptr)
-            return mpoSource->ReadBlock(oBlock, oPart, pTarget, oJob.mnPitch);
-        return raster::CopyRows(oPixels.mpFirst, oPixels.mnPitch, pTarget, oJob.mnPitch, oPart.mnWidth * nPixelBytes,
-                                oPart.mnHeight);
+        {
+            if (!mbParts && nFollowing != 0)
+                mpoSource->Expect(oBlock, nFollowing + 1);
+            mpoSource->ReadBlock(oBlock, oPart, pTarget, oJob.mnPitch);
+            return true;
+        }
+        raster::CopyRows(oPixels.mpFirst, oPixels.mnPitch, pTarget, oJob.mnPitch, oPart.mnWidth * nPixelBytes,
+                         oPart.mnHeight);
+        return true;
     }
     const std::size_t nRowBytes = std::max<std::size_t>(1, oPart.mnWidth * nPixelBytes);
     const auto nSlice = mbParts && eKeep == Keep::eNothing
@@ -345,40 +417,52 @@ void BlockImage::ReadOnePlane(const Job& oJob, const BlockAddress& oBlock, const
     for (unsigned int nRow = 0; nRow < oPart.mnHeight; nRow += std::min(nSlice, oPart.mnHeight - nRow))
     {
         const PixelRect oSlice{oPart.mnX, oPart.mnY + nRow, oPart.mnWidth, std::min(nSlice, oPart.mnHeight - nRow)};
-        const Pixels oPixels = ObtainPart(oBlock, oSlice, eKeep, moScratch);
+        const Pixels oPixels = ObtainPart(oBlock, oSlice, eKeep, moScratch, nFollowing, eWait);
+        if (oPixels.mbComing)
+            return false;
         raster::GatherChannels(oPixels.mpFirst, oPixels.mnPitch, moLayout.GetPlane(oBlock.mnPlane).mnChannels,
                                pTarget + nRow * oJob.mnPitch, oJob.mnPitch, oJob.moChannels.GetPositions().data(),
                                oJob.moChannels.GetCount(),
                                {oSlice.mnWidth, oSlice.mnHeight, oJob.moChannels.GetValueBytes()});
     }
+    return true;
 }
 
-void BlockImage::ReadPlanes(const Job& oJob, const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
-                            unsigned char* pTarget)
+// Planes whose blocks another thread decodes come last. Nothing is given back half done: without waiting, the planes
+// that are there are taken when all of them are.
+bool BlockImage::ReadPlanes(const Job& oJob, const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
+                            unsigned char* pTarget, Wait eWait)
 {
     const ChannelSelection& oChannels = oJob.moChannels;
     const raster::PixelArea oArea{oPart.mnWidth, oPart.mnHeight, oChannels.GetValueBytes()};
     const PixelRect oRect = moLayout.GetBlockRect(oBlock.mnColumn, oBlock.mnRow);
     const std::size_t nBlockBytes = std::size_t{oRect.mnWidth} * oRect.mnHeight * oChannels.GetValueBytes();
-    const std::size_t nLimit = eKeep != Keep::eNothing ? GetCache().GetBound() : PLANES_BYTES;
+    const std::size_t nLimit = eKeep == Keep::eNothing ? PLANES_BYTES
+                               : mbParts               ? mpoRowCache->GetBound()
+                                                       : MOST_PLANES_BYTES;
     const bool bTogether = oChannels.IsSinglePlanes() && nBlockBytes <= nLimit / oChannels.GetCount();
     if (bTogether && moPlaneScratch.size() < oChannels.GetCount())
         moPlaneScratch.resize(oChannels.GetCount());
 
     std::vector<Pixels> oPixels(bTogether ? oChannels.GetCount() : 0);
+    bool bAll = true;
     for (std::size_t nAt = 0; nAt < oChannels.GetCount(); ++nAt)
     {
         const ChannelPlace& oPlace = oChannels.GetPlaces()[nAt];
         Scratch& oScratch = bTogether ? moPlaneScratch[nAt] : moScratch;
-        const Pixels oPart1 = ObtainPart({oPlace.mnPlane, oBlock.mnColumn, oBlock.mnRow}, oPart, eKeep, oScratch);
-        if (bTogether)
-            oPixels[nAt] = oPart1;
+        Pixels oPart1 = ObtainPart({oPlace.mnPlane, oBlock.mnColumn, oBlock.mnRow}, oPart, eKeep, oScratch,
+                                   oJob.moRange.mnRight - oBlock.mnColumn, eWait);
+        if (oPart1.mbComing)
+            bAll = false;
+        else if (bTogether)
+            oPixels[nAt] = std::move(oPart1);
         else
             CopyChannel(oPart1.mpFirst, oPart1.mnPitch, oPlace.mnPosition, moLayout.GetPlane(oPlace.mnPlane).mnChannels,
                         pTarget, oJob.mnPitch, nAt, oChannels.GetCount(), oArea);
     }
-    if (bTogether)
+    if (bAll && bTogether)
         InterleaveParts(oPixels, pTarget, oJob.mnPitch, oArea);
+    return bAll;
 }
 
 void BlockImage::InterleaveParts(const std::vector<Pixels>& oParts, unsigned char* pTarget, std::size_t nPitch,
@@ -425,6 +509,14 @@ void BlockImage::Write(const ChannelSelection& oChannels, const PixelRect& oRect
                 WritePart(oChannels, oRect, {nPlane, nColumn, nRow}, pSource, nPitch);
 }
 
+void BlockImage::ForgetBlock(const BlockAddress& oBlock)
+{
+    if (!mbParts)
+        return moTiles.Drop(oBlock);
+    mpoRowCache->Drop({oBlock.mnPlane, moLayout.GetBlockIndex(oBlock.mnColumn, oBlock.mnRow)});
+    mpoThinCache->Clear();
+}
+
 // Channels of the plane that are not written keep their values: the part is read before.
 void BlockImage::WritePart(const ChannelSelection& oChannels, const PixelRect& oRect, const BlockAddress& oBlock,
                            const unsigned char* pSource, std::size_t nPitch)
@@ -434,9 +526,7 @@ void BlockImage::WritePart(const ChannelSelection& oChannels, const PixelRect& o
     pSource += (oPart.mnY - oRect.mnY) * nPitch + (oPart.mnX - oRect.mnX) * oChannels.GetPixelBytes();
     oPart.mnX -= oBlockRect.mnX;
     oPart.mnY -= oBlockRect.mnY;
-    GetCache().Drop({this, oBlock.mnPlane, moLayout.GetBlockIndex(oBlock.mnColumn, oBlock.mnRow)});
-    if (mpoThinCache)
-        mpoThinCache->Clear();
+    ForgetBlock(oBlock);
     if (oChannels.IsWholePlane())
         return mpoSource->WriteBlock(oBlock, oPart, pSource, nPitch);
 
@@ -445,10 +535,11 @@ void BlockImage::WritePart(const ChannelSelection& oChannels, const PixelRect& o
     unsigned char* pPlane = moScratch.Get(nPlanePitch * oPart.mnHeight);
     if (!oChannels.CoversPlane(oBlock.mnPlane, nPlaneChannels))
     {
-        const Pixels oOld = ObtainPart(oBlock, oPart, mbParts ? Keep::eNothing : Keep::eBlock, moScratch);
+        const Pixels oOld =
+            ObtainPart(oBlock, oPart, mbParts ? Keep::eNothing : Keep::eBlock, moScratch, 0, Wait::eYes);
         if (oOld.mpFirst != pPlane)
             raster::CopyRows(oOld.mpFirst, oOld.mnPitch, pPlane, nPlanePitch, nPlanePitch, oPart.mnHeight);
-        GetCache().Drop({this, oBlock.mnPlane, moLayout.GetBlockIndex(oBlock.mnColumn, oBlock.mnRow)});
+        ForgetBlock(oBlock);
     }
     const raster::PixelArea oArea{oPart.mnWidth, oPart.mnHeight, oChannels.GetValueBytes()};
     for (std::size_t nAt = 0; nAt < oChannels.GetCount(); ++nAt)

@@ -2,12 +2,16 @@
 
 #include "plugins/support/file/scratch.h"
 #include "plugins/support/image/blockcache.h"
+#include "plugins/support/image/blocktiles.h"
 #include "plugins/support/image/iblocksource.h"
+#include "plugins/support/image/passorder.h"
+#include "plugins/support/image/rowcache.h"
 #include "toolkit/exceptions/place.h"
 #include "toolkit/raster/interleave.h"
 
 #include <cstddef>
 #include <memory>
+#include <utility>
 #include <vector>
 
 namespace krv::plugins::support
@@ -48,14 +52,15 @@ private:
 };
 
 // An image made of blocks, read and written in rectangles. Blocks that are wanted whole are decoded straight into the
-// caller's memory; others go through the cache, so that neighbouring windows decode each block once. Sources that read
-// parts are asked for just the rows that a window touches, unless consecutive windows share blocks. One thread at a
-// time.
+// caller's memory; others go through the process's store, so that neighbouring windows, of whatever reader, decode each
+// block once. A block that another thread is decoding is taken last, when everything else of the window is done.
+// Sources that read parts are asked for just the rows that a window touches, unless consecutive windows share blocks.
+// One thread at a time.
 class BlockImage
 {
 public:
-    // oCache: shared by the images of one dataset.
-    BlockImage(std::shared_ptr<IBlockSource> poSource, std::shared_ptr<BlockCache> poCache);
+    // poCache: of the dataset.
+    BlockImage(std::shared_ptr<IBlockSource> poSource, const std::shared_ptr<BlockCache>& poCache);
     ~BlockImage();
     BlockImage(const BlockImage&) = delete;
     BlockImage& operator=(const BlockImage&) = delete;
@@ -84,11 +89,14 @@ private:
         eBlock
     };
 
-    void ReadPart(const Job& oJob, unsigned int nColumn, unsigned int nRow);
-    void ReadOnePlane(const Job& oJob, const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
-                      unsigned char* pTarget);
-    void ReadPlanes(const Job& oJob, const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
-                    unsigned char* pTarget);
+    using Wait = BlockTiles::Wait;
+
+    // False: a block that another thread decodes was left out, since eWait says not to wait.
+    [[nodiscard]] bool ReadPart(const Job& oJob, unsigned int nColumn, unsigned int nRow, Wait eWait);
+    [[nodiscard]] bool ReadOnePlane(const Job& oJob, const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
+                                    unsigned char* pTarget, Wait eWait);
+    [[nodiscard]] bool ReadPlanes(const Job& oJob, const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep,
+                                  unsigned char* pTarget, Wait eWait);
     static void InterleaveParts(const std::vector<Pixels>& oParts, unsigned char* pTarget, std::size_t nPitch,
                                 const raster::PixelArea& oArea);
     void CopyChannel(const unsigned char* pSource, std::size_t nSourcePitch, std::size_t nSourceChannel,
@@ -96,26 +104,35 @@ private:
                      std::size_t nTargetChannel, std::size_t nTargetChannels, const raster::PixelArea& oArea);
     void WritePart(const ChannelSelection& oChannels, const PixelRect& oRect, const BlockAddress& oBlock,
                    const unsigned char* pSource, std::size_t nPitch);
+    void ForgetBlock(const BlockAddress& oBlock);
     void ReserveRowCache(const Job& oJob);
     bool IsThin(unsigned int nRows) const;
     unsigned int CountThinRows(const Job& oJob) const;
-    Pixels ObtainPart(const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep, Scratch& oScratch);
+    Pixels ObtainPart(const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep, Scratch& oScratch,
+                      unsigned int nFollowing, Wait eWait);
+    Pixels ObtainKept(const BlockAddress& oBlock, const PixelRect& oPart, Keep eKeep, unsigned int nFollowing,
+                      Wait eWait);
     Pixels FindBlock(const BlockAddress& oBlock, const PixelRect& oPart);
-    Pixels LoadBlock(const BlockAddress& oBlock, const PixelRect& oPart);
-    Pixels TryLoad(const BlockAddress& oBlock, const PixelRect& oPart);
+    Pixels LoadBlock(const BlockAddress& oBlock, const PixelRect& oPart, unsigned int nFollowing, Wait eWait);
+    Pixels LoadPlainBlock(const BlockAddress& oBlock, const PixelRect& oPart);
+    Pixels TryLoad(const BlockAddress& oBlock, const PixelRect& oPart, unsigned int nFollowing, Wait eWait);
     Pixels GetRows(const BlockAddress& oBlock, const PixelRect& oPart);
-    void FillEntry(BlockCache& oCache, const BlockCache::Key& oKey, const BlockAddress& oBlock, const PixelRect& oPart,
+    void FillEntry(RowCache& oCache, const RowCache::Key& oKey, const BlockAddress& oBlock, const PixelRect& oPart,
                    unsigned char* pTarget);
+    void Announce(const BlockAddress& oBlock, unsigned int nFollowing);
     Keep ChooseKeep(const Job& oJob, unsigned int nColumn, unsigned int nRow, const PixelRect& oPart) const;
     void NoteWindow(const Range& oRange, unsigned int nPlane);
-    BlockCache& GetCache() const { return mbParts ? *mpoRowCache : *mpoCache; }
+    void NotePass(const Job& oJob);
 
     std::shared_ptr<IBlockSource> mpoSource;
     const ImageLayout& moLayout;
-    std::shared_ptr<BlockCache> mpoCache;
-    // For sources that read parts: few blocks suffice, and few stay in the processor's own caches.
-    std::unique_ptr<BlockCache> mpoRowCache;
-    std::unique_ptr<BlockCache> mpoThinCache;
+    BlockTiles moTiles;
+    PassOrder moPass;
+    std::vector<std::pair<unsigned int, unsigned int>> moLater; // blocks of a window that another thread decodes
+    BlockAddress moForeseen;                                    // the first block behind those that were foreseen last
+    // For sources that read parts.
+    std::unique_ptr<RowCache> mpoRowCache;
+    std::unique_ptr<RowCache> mpoThinCache;
     bool mbParts;
     bool mbSmallBlocks;
     Scratch moScratch;

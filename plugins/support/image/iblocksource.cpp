@@ -12,4 +12,13 @@ void IBlockSource::WriteBlock(const BlockAddress&, const PixelRect&, const unsig
     throw DataException(GetName() + ": pixels cannot be written");
 }
 
+BlockOrigin IBlockSource::GetOrigin() const
+{
+    return {};
+}
+
+void IBlockSource::Expect(const BlockAddress&, unsigned int) {}
+
+void IBlockSource::Foresee(const BlockAddress&, unsigned int) {}
+
 } // namespace krv::plugins::support

@@ -1,8 +1,10 @@
 #pragma once
 
+#include "plugins/support/file/file.h"
 #include "plugins/support/image/imagelayout.h"
 
 #include <cstddef>
+#include <memory>
 #include <string>
 
 namespace krv::plugins::support
@@ -14,6 +16,16 @@ struct BlockAddress
     unsigned int mnPlane = 0;
     unsigned int mnColumn = 0;
     unsigned int mnRow = 0;
+};
+
+// Where the pixels of an image come from, so that datasets which read the same share what they decoded.
+struct BlockOrigin
+{
+    // All pixels come from this file alone, and depend on nothing but what it held when it was opened. Null: nobody
+    // shares.
+    std::shared_ptr<const File> mpoFile;
+    // The format, which of the images in the file, and each option by which the format would hand out other pixels.
+    std::string moImage;
 };
 
 // What a format knows of one image: its layout and how a block is read. Everything else (windows, clipping, caching,
@@ -46,6 +58,15 @@ public:
 
     // The name of the file, for messages.
     virtual std::string GetName() const = 0;
+
+    // Unless overridden nobody shares the decoded blocks.
+    virtual BlockOrigin GetOrigin() const;
+
+    // Said before ReadBlock: the nBlocks blocks from oFirst on, to the right, are wanted next, all or some of them.
+    // What is stored side by side can then be read with one call.
+    virtual void Expect(const BlockAddress& oFirst, unsigned int nBlocks);
+    // The same of blocks that are likely to be wanted later.
+    virtual void Foresee(const BlockAddress& oFirst, unsigned int nBlocks);
 };
 
 } // namespace krv::plugins::support

@@ -48,6 +48,7 @@ public:
     unsigned int GetBlockWidth() const { return mnBlockWidth; }
     unsigned int GetBlockHeight() const { return mnBlockHeight; }
     unsigned int GetBlocksAcross() const { return mnBlocksAcross; }
+    unsigned int GetBlocksDown() const { return (mnHeight - 1) / mnBlockHeight + 1; }
 
     // The size that readers are told to use; the block's unless set.
     void SetPreferredBlock(unsigned int nWidth, unsigned int nHeight);

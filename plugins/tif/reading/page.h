@@ -74,6 +74,7 @@ public:
     Page& operator=(const Page&) = delete;
 
     const support::File& GetFile() const { return *mpoFile; }
+    const std::shared_ptr<const support::File>& ShareFile() const { return mpoFile; }
     const std::string& GetFileName() const { return mpoFile->GetName(); }
     const FileHeader& GetHeader() const { return moHeader; }
     const PageForm& GetForm() const { return moForm; }

@@ -23,6 +23,7 @@ public:
 
     const support::ImageLayout& GetLayout() const override { return moLayout; }
     std::string GetName() const override { return mpoPage->GetFileName(); }
+    support::BlockOrigin GetOrigin() const override { return StrileSource::MakeOrigin(*mpoPage, meUse); }
 
     void ReadBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
                    std::size_t nPitch) override

@@ -18,6 +18,10 @@ constexpr std::uint32_t GROUP_ROWS = 256;
 constexpr std::size_t AHEAD_BYTES = std::size_t{1} << 20;
 constexpr std::size_t SLICE_BYTES = std::size_t{256} << 10;
 constexpr std::size_t KEPT_RAW_BYTES = std::size_t{4} << 20;
+// Reading so many bytes that nobody wants is cheaper than another call to the system.
+constexpr std::size_t GAP_BYTES = 4096;
+// Strips or tiles that lie further apart are not fetched together.
+constexpr std::uint64_t MOST_FORESEEN_BYTES = std::uint64_t{32} << 20;
 
 bool IsPlain(const PageForm& oForm)
 {
@@ -79,16 +83,80 @@ void StrileSource::ReadBlock(const support::BlockAddress& oBlock, const support:
 {
     if (!moForm.mbTiled)
         return ReadStrips(oBlock, oPart, pTarget, nPitch);
-    const std::uint64_t nStrile =
-        (std::uint64_t{oBlock.mnPlane} * moForm.mnStrilesDown + oBlock.mnRow) * moForm.mnStrilesAcross +
-        oBlock.mnColumn;
-    ReadPiece({static_cast<std::uint32_t>(nStrile),
+    const std::uint32_t nStrile = GetFirstStrile(oBlock);
+    const bool bExpected = nStrile >= mnExpected && nStrile < mnExpectedEnd;
+    ReadPiece({nStrile,
                moForm.mnStrileHeight,
                oPart.mnX,
                oPart.mnY,
                {oPart.mnWidth, oPart.mnHeight, pTarget, nPitch},
-               0},
+               bExpected ? static_cast<std::uint32_t>(mnExpectedEnd - 1 - nStrile) : 0},
               oPart.mnHeight);
+}
+
+support::BlockOrigin StrileSource::MakeOrigin(const Page& oPage, PixelUse eUse)
+{
+    return {oPage.ShareFile(), "TIF " + std::to_string(oPage.GetDirectory().GetOffset()) +
+                                   (eUse == PixelUse::eBitmap ? " bitmap" : " image")};
+}
+
+std::uint32_t StrileSource::GetFirstStrile(const support::BlockAddress& oBlock) const
+{
+    const std::uint64_t nRow =
+        moForm.mbTiled ? oBlock.mnRow : oBlock.mnRow * std::uint64_t{moLayout.GetBlockHeight()} / moForm.mnStrileHeight;
+    return static_cast<std::uint32_t>(
+        (std::uint64_t{oBlock.mnPlane} * moForm.mnStrilesDown + nRow) * moForm.mnStrilesAcross + oBlock.mnColumn);
+}
+
+void StrileSource::Expect(const support::BlockAddress& oFirst, unsigned int nBlocks)
+{
+    if (!moForm.mbTiled)
+        return;
+    mnExpected = GetFirstStrile(oFirst);
+    mnExpectedEnd = mnExpected + nBlocks;
+}
+
+// Where the stored bytes of a strip or tile end, together with those of the ones after it that lie behind it with
+// hardly a gap. What is damaged among these is none of the first one's business.
+std::uint64_t StrileSource::FindEnd(std::uint32_t nStrile, std::uint32_t nFollowing, std::uint64_t nMost)
+{
+    const Strile oFirst = mpoPage->GetStriles().Get(nStrile);
+    std::uint64_t nEnd = oFirst.mnOffset + std::min(oFirst.mnBytes, nMost);
+    try
+    {
+        for (std::uint32_t nAt = 1; nAt <= nFollowing; ++nAt)
+        {
+            const Strile oNext = mpoPage->GetStriles().Get(nStrile + nAt);
+            if (!oNext.mbBytesKnown || oNext.mnOffset < nEnd || oNext.mnOffset - nEnd > GAP_BYTES ||
+                oNext.mnBytes > nMost || oNext.mnOffset + oNext.mnBytes - oFirst.mnOffset > nMost)
+                break;
+            nEnd = oNext.mnOffset + oNext.mnBytes;
+        }
+    }
+    catch (const krv::FileException&)
+    {
+    }
+    return std::min(nEnd, mpoPage->GetFile().GetSize());
+}
+
+void StrileSource::Foresee(const support::BlockAddress& oFirst, unsigned int nBlocks)
+{
+    if (!mpoPage->GetFile().IsSlow())
+        return;
+    const std::uint32_t nStriles =
+        moForm.mbTiled ? nBlocks : (moLayout.GetBlockHeight() - 1) / moForm.mnStrileHeight + 1;
+    const std::uint32_t nFirst = GetFirstStrile(oFirst);
+    try
+    {
+        const Strile oStrile = mpoPage->GetStriles().Get(nFirst);
+        if (oStrile.IsStored() && oStrile.mbBytesKnown && oStrile.mnBytes <= MOST_FORESEEN_BYTES)
+            mpoPage->GetFile().Foresee(oStrile.mnOffset,
+                                       FindEnd(nFirst, nStriles - 1, MOST_FORESEEN_BYTES) - oStrile.mnOffset);
+    }
+    catch (const krv::FileException&)
+    {
+        // Told when it is read.
+    }
 }
 
 void StrileSource::ReadStrips(const support::BlockAddress& oBlock, const support::PixelRect& oPart,
@@ -210,9 +278,13 @@ unsigned char* StrileSource::ReadRaw(const Piece& oPiece, const Strile& oStrile)
     const auto nRaw = static_cast<std::size_t>(oStrile.mnBytes);
     if (oStrile.mnOffset >= mnRawOffset && oStrile.mnOffset + nRaw <= mnRawOffset + mnRawBytes)
         return moRaw.Get(0) + (oStrile.mnOffset - mnRawOffset);
-    const std::size_t nAhead = std::min<std::uint64_t>(std::min<std::uint64_t>(AHEAD_BYTES, nSize - oStrile.mnOffset),
-                                                       (nRaw + nRaw / 8) * (oPiece.mnFollowing + std::uint64_t{1}));
-    const std::size_t nBytes = oPiece.mnFollowing == 0 ? nRaw : std::max(nRaw, nAhead);
+    std::uint64_t nAhead = nRaw;
+    if (oPiece.mnFollowing != 0 && moForm.mbTiled)
+        nAhead = FindEnd(oPiece.mnStrile, oPiece.mnFollowing, AHEAD_BYTES) - oStrile.mnOffset;
+    else if (oPiece.mnFollowing != 0)
+        nAhead = std::min<std::uint64_t>(std::min<std::uint64_t>(AHEAD_BYTES, nSize - oStrile.mnOffset),
+                                         (nRaw + nRaw / 8) * (oPiece.mnFollowing + std::uint64_t{1}));
+    const auto nBytes = static_cast<std::size_t>(std::max<std::uint64_t>(nRaw, nAhead));
     mnRawBytes = 0;
     moRaw.Shrink(std::max(KEPT_RAW_BYTES, nBytes));
     unsigned char* pRaw = moRaw.Get(nBytes);

@@ -40,6 +40,11 @@ public:
     // A block may be several strips.
     bool SparesParts() const override { return !moForm.mbTiled; }
     std::string GetName() const override { return mpoPage->GetFileName(); }
+    support::BlockOrigin GetOrigin() const override { return MakeOrigin(*mpoPage, meUse); }
+    void Expect(const support::BlockAddress& oFirst, unsigned int nBlocks) override;
+    void Foresee(const support::BlockAddress& oFirst, unsigned int nBlocks) override;
+
+    static support::BlockOrigin MakeOrigin(const Page& oPage, PixelUse eUse);
 
     // To be called after the file was written: what was read ahead is read anew.
     void Forget() { mnRawBytes = 0; }
@@ -53,7 +58,7 @@ private:
         unsigned int mnX; // of the first wanted pixel, inside the strip or tile
         unsigned int mnY;
         WantedPixels moWanted;
-        std::uint32_t mnFollowing; // strips that will be asked for next
+        std::uint32_t mnFollowing; // strips or tiles that will be asked for next
     };
 
     void ReadStrips(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
@@ -64,6 +69,8 @@ private:
     std::uint32_t ReadPlain(Piece oPiece, const Strile& oStrile, std::uint32_t nRowsWanted);
     void ReadCoded(const Piece& oPiece, const Strile& oStrile);
     unsigned char* ReadRaw(const Piece& oPiece, const Strile& oStrile);
+    std::uint64_t FindEnd(std::uint32_t nStrile, std::uint32_t nFollowing, std::uint64_t nMost);
+    std::uint32_t GetFirstStrile(const support::BlockAddress& oBlock) const;
     void CheckPlainBytes(const Piece& oPiece, const Strile& oStrile) const;
 
     std::shared_ptr<Page> mpoPage;
@@ -75,7 +82,10 @@ private:
     support::Scratch moRows;
     support::Scratch moPacked;
     support::Scratch moWide;
-    // Stored bytes, read together with those of the strips that follow.
+    // Tiles that will be asked for.
+    std::uint64_t mnExpected = 0;
+    std::uint64_t mnExpectedEnd = 0;
+    // Stored bytes, read together with those of the strips or tiles that follow.
     support::Scratch moRaw;
     std::uint64_t mnRawOffset = 0;
     std::size_t mnRawBytes = 0;

@@ -1,27 +1,27 @@
-#include "plugins/support/image/blockcache.h"
+#include "plugins/support/image/rowcache.h"
 
 #include <algorithm>
-#include <iterator>
 
 namespace krv::plugins::support
 {
 
-std::size_t BlockCache::KeyHash::operator()(const Key& oKey) const
+std::size_t RowCache::KeyHash::operator()(const Key& oKey) const
 {
-    std::uint64_t nHash = reinterpret_cast<std::uintptr_t>(oKey.mpImage) >> 4;
-    nHash = (nHash ^ oKey.mnPlane) * 0x9E3779B97F4A7C15ull;
+    std::uint64_t nHash = oKey.mnPlane * 0x9E3779B97F4A7C15ull;
     nHash = (nHash ^ (nHash >> 29) ^ oKey.mnBlock) * 0xBF58476D1CE4E5B9ull;
     nHash ^= (std::uint64_t{oKey.mnFirstRow} << 32 | oKey.mnRows) * 0x94D049BB133111EBull;
     return static_cast<std::size_t>(nHash ^ (nHash >> 32));
 }
 
-void BlockCache::Reserve(std::uint64_t nBytes)
+void RowCache::Reserve(std::uint64_t nBytes)
 {
-    const auto nWanted = static_cast<std::size_t>(std::min<std::uint64_t>(nBytes, MAXIMUM_BOUND));
-    mnBound = std::max(mnBound, nWanted);
+    if (nBytes <= mnBound)
+        return;
+    const std::uint64_t nShare = krv::cache::TileStore::Process().GetBudget() / 8;
+    mnBound = std::max(mnBound, static_cast<std::size_t>(std::min({nBytes, nShare, std::uint64_t{MOST_BOUND}})));
 }
 
-unsigned char* BlockCache::Find(const Key& oKey)
+unsigned char* RowCache::Find(const Key& oKey)
 {
     const auto oFound = moIndex.find(oKey);
     if (oFound == moIndex.end())
@@ -30,7 +30,7 @@ unsigned char* BlockCache::Find(const Key& oKey)
     return oFound->second->mpoBlock.get();
 }
 
-std::unique_ptr<unsigned char[]> BlockCache::MakeRoom(std::size_t nBytes)
+std::unique_ptr<unsigned char[]> RowCache::MakeRoom(std::size_t nBytes)
 {
     std::unique_ptr<unsigned char[]> poBlock;
     while (!moEntries.empty() && (nBytes > mnBound || mnBytes > mnBound - nBytes))
@@ -46,7 +46,7 @@ std::unique_ptr<unsigned char[]> BlockCache::MakeRoom(std::size_t nBytes)
     return poBlock;
 }
 
-unsigned char* BlockCache::Add(const Key& oKey, std::size_t nBytes)
+unsigned char* RowCache::Add(const Key& oKey, std::size_t nBytes)
 {
     Drop(oKey);
     std::unique_ptr<unsigned char[]> poBlock = MakeRoom(nBytes);
@@ -55,10 +55,11 @@ unsigned char* BlockCache::Add(const Key& oKey, std::size_t nBytes)
     moEntries.push_front({oKey, nBytes, std::move(poBlock)});
     moIndex[oKey] = moEntries.begin();
     mnBytes += nBytes;
+    moCharge.Set(mnBytes);
     return moEntries.front().mpoBlock.get();
 }
 
-void BlockCache::Drop(const Key& oKey)
+void RowCache::Drop(const Key& oKey)
 {
     const auto oFound = moIndex.find(oKey);
     if (oFound == moIndex.end())
@@ -69,22 +70,12 @@ void BlockCache::Drop(const Key& oKey)
     moEntries.erase(oEntry);
 }
 
-void BlockCache::DropImage(const void* pImage)
-{
-    for (auto oEntry = moEntries.begin(); oEntry != moEntries.end();)
-    {
-        const auto oNext = std::next(oEntry);
-        if (oEntry->moKey.mpImage == pImage)
-            Drop(oEntry->moKey);
-        oEntry = oNext;
-    }
-}
-
-void BlockCache::Clear()
+void RowCache::Clear()
 {
     moIndex.clear();
     moEntries.clear();
     mnBytes = 0;
+    moCharge.Set(0);
 }
 
 } // namespace krv::plugins::support
