@@ -23,17 +23,17 @@ public:
                         std::vector<unsigned char>& oBytes) = 0;
 };
 
-// Encoding apart from storing: a facet of datasets that have IEncodedBlocks too, found by dynamic_cast. So blocks can be
-// encoded on all cores while one thread stores them. The order of the virtual operations is public and fixed.
+// Encoding apart from storing: a facet of datasets that have IEncodedBlocks too, found by dynamic_cast. So blocks can
+// be encoded on all cores while one thread stores them. The order of the virtual operations is public and fixed.
 class KRV_DATASOURCES_API IBlockEncoding
 {
 public:
     virtual ~IBlockEncoding();
 
     // A new encoder for the blocks of the image (level 1) or of a level as they are laid out, owned by the caller. It
-    // takes what it needs with it and is of no more use when these are laid out anew. Null when blocks cannot be encoded
-    // one without the other, or not at all: pixels are written by the raster I/O then, or not either. To be called by
-    // the dataset's own thread. Throws DataException for a level that does not exist.
+    // takes what it needs with it and is of no more use when these are laid out anew. Null when blocks cannot be
+    // encoded one without the other, or not at all: pixels are written by the raster I/O then, or not either. To be
+    // called by the dataset's own thread. Throws DataException for a level that does not exist.
     virtual IBlockEncoder* MakeBlockEncoder(unsigned int nLevel) = 0;
 };
 

@@ -14,9 +14,9 @@ namespace krv::threading
 {
 
 // Makes a result of each of the items 0 to nItems - 1 by oWork(nItem), on any threads of the group, and hands it to
-// oTake(result), in the thread that owns the group. Results that wait are bounded by GetAhead and nMostAhead. The first exception in
-// the order of taking ends all and passes, so that in the order of the items it is the same one for any number of
-// threads; work that has not begun is dropped, nothing runs any more when this returns.
+// oTake(result), in the thread that owns the group. Results that wait are bounded by GetAhead and nMostAhead. The first
+// exception in the order of taking ends all and passes, so that in the order of the items it is the same one for any
+// number of threads; work that has not begun is dropped, nothing runs any more when this returns.
 template <typename Work, typename Take>
 void ForEachItem(TaskGroup& oGroup, std::uint64_t nItems, Work oWork, Take oTake,
                  TaskOrder eOrder = TaskOrder::eAsAdded, std::size_t nMostAhead = SIZE_MAX)

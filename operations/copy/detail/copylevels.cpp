@@ -107,7 +107,7 @@ public:
         std::iota(oAll.begin(), oAll.end(), 1U);
         if (bCheck && !oForm.mbSeparate)
             moPlanes.push_back(mpoFile->Read(oAll, nLevel));
-        for (const unsigned int nChannel : bCheck && oForm.mbSeparate ? oAll : std::vector<unsigned int>())
+        for (const unsigned int nChannel : bCheck&& oForm.mbSeparate ? oAll : std::vector<unsigned int>())
             moPlanes.push_back(mpoFile->Read({nChannel}, nLevel));
     }
 
@@ -115,7 +115,8 @@ public:
     {
         const PixelWindow oPart = GetPart(moForm, oBlock);
         const unsigned int nChannels = moForm.mbSeparate ? 1 : moForm.mnChannels;
-        MovedBlock oMoved{oBlock, krv::gobs::BufferBytes(oPart.width, oPart.height, nChannels, moForm.moType), false, {}};
+        MovedBlock oMoved{
+            oBlock, krv::gobs::BufferBytes(oPart.width, oPart.height, nChannels, moForm.moType), false, {}};
         oMoved.stored = moBlocks.ReadEncoded(mnLevel, oBlock, oMoved.bytes);
         if (oMoved.stored && !moPlanes.empty())
             CheckPixels(moPlanes[oBlock.mnPlane].Get(), oPart);
@@ -282,7 +283,10 @@ std::string ChooseMethod(const Target& oTarget, const std::string& own)
     return bIndexed ? "mode" : "average";
 }
 
-void BuildLevels(const Target& oTarget, const std::vector<unsigned int>& oLevels, const std::string& method)
+// The source's pixels are read in place of the target's where they are the same: others than its own thread can open
+// it.
+void BuildLevels(const CopyPlan& oPlan, const Target& oTarget, const std::vector<unsigned int>& oLevels,
+                 const std::string& method)
 {
     if (oLevels.empty())
         return;
@@ -294,6 +298,12 @@ void BuildLevels(const Target& oTarget, const std::vector<unsigned int>& oLevels
         Report(oTarget.GetProgress(), {"overviews", nDone * nPixelBytes, nTotal * nPixelBytes});
         return true;
     };
+    oOptions.mpoExecutor = oTarget.GetExecutor();
+    if (oPlan.IsWholeFile() && !oPlan.IsCut() && oPlan.AreTypesKept() && (oTarget.TakesBlocks() || !oTarget.IsLossy()))
+        oOptions.moMakeReader = [&oPlan]
+        {
+            return oPlan.GetSource(0).ReadAgain(AllChannels(oPlan));
+        };
     BuildOverviews(oWriter, oLevels, method, oOptions);
 }
 
@@ -308,11 +318,9 @@ void MoveBlocks(const CopyPlan& oPlan, const Target& oTarget, unsigned int nLeve
     ProgressCounter oCounter(oTarget.GetProgress(), nLevel == 1 ? "convert" : "overviews",
                              krv::gobs::BufferBytes(oForm.mnWidth, oForm.mnHeight, oForm.mnChannels, oForm.moType));
     const bool bCheck = oTarget.IsChecked() && oForm.moCodec != "NONE";
-    FileWorkers<BlockReader> oWorkers(oSource,
-                                      [&](FilePointer poFile)
-                                      {
-                                          return std::make_unique<BlockReader>(std::move(poFile), oForm, nLevel, bCheck);
-                                      });
+    FileWorkers<BlockReader> oWorkers(
+        oSource,
+        [&](FilePointer poFile) { return std::make_unique<BlockReader>(std::move(poFile), oForm, nLevel, bCheck); });
     krv::threading::TaskGroup oThreads(oTarget.GetExecutor(), [&oCounter] { oCounter.Repeat(); });
     krv::threading::ForEachItem(
         oThreads, oGrid.CountRuns(),
@@ -347,9 +355,9 @@ void CopyLevels(const CopyPlan& oPlan, const Target& oTarget, const BitmapNumber
     std::erase_if(oLevels,
                   [&](unsigned int nLevel) { return nLevel < 2 || nLevel >= std::max(oWindow.width, oWindow.height); });
     if (oLevels.empty())
-        return bWanted
-                   ? BuildLevels(oTarget, GetDefaultLevels(oWindow.width, oWindow.height), ChooseMethod(oTarget, ""))
-                   : void();
+        return bWanted ? BuildLevels(oPlan, oTarget, GetDefaultLevels(oWindow.width, oWindow.height),
+                                     ChooseMethod(oTarget, ""))
+                       : void();
     std::vector<unsigned int> oAnew;
     LevelCopy oCopy(oPlan, oTarget, *poTo);
     for (const unsigned int nLevel : oLevels)
@@ -366,7 +374,7 @@ void CopyLevels(const CopyPlan& oPlan, const Target& oTarget, const BitmapNumber
     if (own != method)
         Target::Warn(fmt::format("{}: levels {} are made anew by {}: the file does not say how they were made", name,
                                  fmt::join(oAnew, ", "), method));
-    oTarget.Try("levels", [&] { BuildLevels(oTarget, oAnew, method); });
+    oTarget.Try("levels", [&] { BuildLevels(oPlan, oTarget, oAnew, method); });
 }
 
 } // namespace krv::operations::detail

@@ -91,9 +91,8 @@ public:
     std::shared_ptr<const Raster> Read(const PixelWindow& oPart, unsigned int nX, unsigned int nY)
     {
         const RasterContext oFrom(static_cast<int>(oPart.x), static_cast<int>(oPart.y));
-        const auto poPiece =
-            std::make_shared<Raster>(RasterInfo(oPart.width, oPart.height, mnChannels, moType),
-                                     RasterContext(static_cast<int>(nX), static_cast<int>(nY)));
+        const auto poPiece = std::make_shared<Raster>(RasterInfo(oPart.width, oPart.height, mnChannels, moType),
+                                                      RasterContext(static_cast<int>(nX), static_cast<int>(nY)));
         std::vector<std::unique_ptr<Raster>> oParts;
         std::vector<const unsigned char*> oPixels;
         for (const LevelReader& oSource : moReaders)
@@ -101,7 +100,7 @@ public:
             IRasterReader& oReader = oSource.Get();
             const RasterInfo oInfo(oPart.width, oPart.height, oReader.GetChansCount(), oReader.GetDataType());
             oParts.push_back(moMerger ? std::make_unique<Raster>(oInfo, oFrom)
-                                     : std::make_unique<Raster>(oInfo, oFrom, poPiece->GetBuffer(), false));
+                                      : std::make_unique<Raster>(oInfo, oFrom, poPiece->GetBuffer(), false));
             oReader.ReadRaster(oParts.back().get());
             oPixels.push_back(oParts.back()->GetBuffer());
         }

@@ -71,8 +71,7 @@ void Target::Warn(const std::string& message)
 Target::Target(const CopyPlan& oPlan, const TargetForm& oForm, const Progress& oProgress,
                krv::threading::IExecutor* poExecutor)
     : moName(oForm.name), moFormat(ChooseFormat(oForm)), moProgress(oProgress), mpoExecutor(poExecutor),
-      mbChecked(oForm.check),
-      mbNew(!std::filesystem::exists(oForm.name))
+      mbChecked(oForm.check), mbNew(!std::filesystem::exists(oForm.name))
 {
     if (const auto oMoved = FindMovedForm(oPlan, oForm.options))
     {

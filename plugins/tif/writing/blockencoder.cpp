@@ -35,16 +35,14 @@ std::unique_ptr<BlockEncoder> BlockEncoder::Make(std::shared_ptr<Page> poPage, s
     return poEncoder->moEncoder.FindObstacle().empty() ? std::move(poEncoder) : nullptr;
 }
 
-void BlockEncoder::Encode(const krv::datasources::BlockNumber& oBlock, const unsigned char* pPixels,
-                          std::size_t nPitch, std::vector<unsigned char>& oBytes)
+void BlockEncoder::Encode(const krv::datasources::BlockNumber& oBlock, const unsigned char* pPixels, std::size_t nPitch,
+                          std::vector<unsigned char>& oBytes)
 {
     GetStrile(*mpoPage, oBlock, Place::Current());
     const PageForm& oForm = mpoPage->GetForm();
-    const std::uint32_t nWidth =
-        std::min(oForm.mnStrileWidth, oForm.mnWidth - oBlock.mnColumn * oForm.mnStrileWidth);
+    const std::uint32_t nWidth = std::min(oForm.mnStrileWidth, oForm.mnWidth - oBlock.mnColumn * oForm.mnStrileWidth);
     const std::uint32_t nRows = std::min(oForm.mnStrileHeight, oForm.mnHeight - oBlock.mnRow * oForm.mnStrileHeight);
-    const auto oCoded =
-        moEncoder.Encode(pPixels, nPitch, nWidth, nRows, oForm.GetStrileRows(oBlock.mnRow), moLike);
+    const auto oCoded = moEncoder.Encode(pPixels, nPitch, nWidth, nRows, oForm.GetStrileRows(oBlock.mnRow), moLike);
     oBytes.assign(oCoded.begin(), oCoded.end());
 }
 
