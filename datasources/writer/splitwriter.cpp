@@ -2,6 +2,7 @@
 
 #include "datasources/interfaces/idataset.h"
 #include "datasources/reader/idatasetaccess.h"
+#include "datasources/writer/ioverviewwriteraccessor.h"
 #include "datasources/writer/irasterwriter.h"
 #include "gobs/raster/raster.h"
 #include "toolkit/raster/interleave.h"
@@ -32,7 +33,10 @@ SplitWriter::SplitWriter(IRasterWriter& oWriter, unsigned int nLevel, unsigned i
     IDataset* const poDataset = poAccess != nullptr ? poAccess->GetDataset() : nullptr;
     auto* const poEncoding = dynamic_cast<IBlockEncoding*>(poDataset);
     auto* const poBlocks = dynamic_cast<IEncodedBlocks*>(poDataset);
-    if (poEncoding == nullptr || poBlocks == nullptr)
+    // Of bitmaps there are no levels, and their blocks are not those of the image.
+    const bool bImage =
+        nLevel != 1 || std::unique_ptr<IOverviewWriterAccessor>(oWriter.GetOverviewWriterAccessor()) != nullptr;
+    if (poEncoding == nullptr || poBlocks == nullptr || !bImage)
         return;
     moForm = poBlocks->GetEncodedForm(nLevel);
     if (!TakesForm())
