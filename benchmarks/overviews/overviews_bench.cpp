@@ -188,7 +188,8 @@ void AverageTiles(const std::vector<unsigned char>& oBytes, const krv::gobs::Dat
         const krv::gobs::PixelBounds oBounds{0, 0, nWidth / nLevel, nHeight / nLevel};
         oTargets.push_back(std::make_unique<krv::gobs::LevelTarget>(
             krv::gobs::TileGatherer(oBounds, 256, 256, nChannels, oType,
-                                    [](const krv::gobs::Raster& oTile) { Keep(oTile.GetBuffer()); }),
+                                    [](const std::unique_ptr<krv::gobs::Raster>& poTile)
+                                    { Keep(poTile->GetBuffer()); }),
             oForm, nullptr));
         oTasks.push_back({nLevel, oBounds, oTargets.back().get()});
     }

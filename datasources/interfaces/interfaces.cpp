@@ -1,6 +1,7 @@
 // The destructors of the pure interfaces: one home each, so that every library shares one type-info per class. And
 // the rule that goes with an interface.
 #include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/iblockencoding.h"
 #include "datasources/interfaces/ichannelfilter.h"
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
@@ -27,6 +28,8 @@ namespace krv::datasources
 {
 
 IBitmapDataset::~IBitmapDataset() = default;
+IBlockEncoder::~IBlockEncoder() = default;
+IBlockEncoding::~IBlockEncoding() = default;
 IChannelFilter::~IChannelFilter() = default;
 IChannelInfo::~IChannelInfo() = default;
 IDataset::~IDataset() = default;

@@ -12,10 +12,13 @@
 #include "datasources/writer/ioverviewwriteraccessor.h"
 #include "datasources/writer/irasterwriter.h"
 #include "datasources/writer/multitypewriter.h"
+#include "datasources/writer/splitwriter.h"
 #include "gobs/resampling/levelreducer.h"
 #include "gobs/resampling/leveltarget.h"
 #include "gobs/resampling/nodatasamples.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/threading/foreachitem.h"
+#include "toolkit/threading/statestore.h"
 
 #include <algorithm>
 #include <bit>
@@ -44,6 +47,8 @@ constexpr unsigned int DEFAULT_SIZE = 256;
 // Windows of the image: no wider than this when they need not be, and no larger than so many bytes.
 constexpr std::uint64_t WINDOW_WIDTH = 4096;
 constexpr std::uint64_t WINDOW_BYTES = std::uint64_t{16} << 20;
+// Of windows that were read and wait.
+constexpr std::uint64_t MOST_AHEAD_BYTES = std::uint64_t{256} << 20;
 
 unsigned int LevelSize(unsigned int nSize, unsigned int nFactor)
 {
@@ -57,8 +62,17 @@ struct Level
     bool mbWhole = true;
     PixelBounds moBounds;
     std::unique_ptr<IRasterWriter> mpoWriter;
+    std::unique_ptr<SplitWriter> mpoSplit;
     std::unique_ptr<IRasterIO> mpoMaskIO;
     std::unique_ptr<LevelTarget> mpoTarget;
+};
+
+// A window of the image, when it was read.
+using WindowPointer = std::unique_ptr<Raster>;
+
+// The caller's progress function said to stop.
+struct Stopped
+{
 };
 
 class OverviewBuilder
@@ -78,8 +92,13 @@ private:
     std::unique_ptr<LevelTarget> MakeTarget(Level& oLevel);
     void MakeReducers();
     void AddBounds(const PixelBounds& oPart);
-    bool ReadBand(unsigned int nTop, unsigned int nBottom);
-    void ReadWindow(const PixelBounds& oBounds);
+    void StoreTile(SplitWriter& oSplit, std::shared_ptr<const Raster> poTile);
+    void Line(std::function<void()> oWork, std::function<void()> oTake);
+    std::vector<PixelBounds> ListWindows() const;
+    static WindowPointer Read(IRasterReader& oReader, const SourceForm& oForm, const PixelBounds& oBounds);
+    void Take(const WindowPointer& poWindow, const PixelBounds& oBounds);
+    void TakeAll(const std::vector<PixelBounds>& oWindows);
+    void Ask() const;
 
     IRasterWriter& moWriter;
     Resampling meMethod;
@@ -94,7 +113,9 @@ private:
     std::unique_ptr<IOverviewManager> mpoMaskManager;
     std::vector<Level> moLevels;
     std::vector<std::unique_ptr<ILevelReducer>> moReducers;
-    PixelBounds moBounds; // of the pixels that are needed
+    krv::threading::TaskGroup moThreads;
+    krv::threading::TaskLine moEncoding; // of tiles of levels, which go in their order to the file
+    PixelBounds moBounds;                // of the pixels that are needed
     unsigned int mnWindowWidth = 0;
     std::uint64_t mnDone = 0;
     std::uint64_t mnTotal = 0;
@@ -108,7 +129,8 @@ OverviewBuilder::OverviewBuilder(IRasterWriter& oWriter, Resampling eMethod, con
       mpoFinisher(moForm.mbValidity
                       ? krv::gobs::MakeValueFinisher(moForm.moType, moValidity.GetNoData(), oOptions.mbNaNIsNoData)
                       : nullptr),
-      mpoAccessor(oWriter.GetOverviewWriterAccessor())
+      mpoAccessor(oWriter.GetOverviewWriterAccessor()), moThreads(oOptions.mpoExecutor, [this] { Ask(); }),
+      moEncoding(moThreads)
 {
     if (const auto* const poAccess = dynamic_cast<const IDatasetAccess*>(&oWriter))
         mpoDataset = poAccess->GetDataset();
@@ -219,18 +241,25 @@ PixelBounds OverviewBuilder::GetChanged(unsigned int nFactor) const
 std::unique_ptr<LevelTarget> OverviewBuilder::MakeTarget(Level& oLevel)
 {
     IRasterWriter& oWriter = *oLevel.mpoWriter;
+    oLevel.mpoSplit = std::make_unique<SplitWriter>(oWriter, oLevel.mnFactor, moThreads.GetThreadCount());
+    SplitWriter& oSplit = *oLevel.mpoSplit;
     auto oTarget = std::make_unique<LevelTarget>(
         TileGatherer(oLevel.moBounds, oWriter.GetTileWidth(), oWriter.GetTileHeight(), moForm.mnChannels, moForm.moType,
-                     [&oWriter](const Raster& oTile) { oWriter.WriteRaster(&oTile); }),
+                     [this, &oSplit](std::unique_ptr<Raster> poTile) { StoreTile(oSplit, std::move(poTile)); }),
         moForm, mpoFinisher.get());
     if (mnMask == 0)
         return oTarget;
     oLevel.mpoMaskIO.reset(mpoMaskManager->GetOverviewIO(oLevel.mnFactor, {mnMask}));
     IRasterIO& oIO = *oLevel.mpoMaskIO;
-    const auto Store = [&oIO](const Raster& oTile)
+    // In their turn among the tiles of pixels.
+    const auto Store = [this, &oIO](std::shared_ptr<Raster> poTile)
     {
-        oIO.WriteWindow(static_cast<unsigned int>(oTile.GetX()), static_cast<unsigned int>(oTile.GetY()),
-                        oTile.GetWidth(), oTile.GetHeight(), const_cast<unsigned char*>(oTile.GetBuffer()));
+        const auto Write = [&oIO, poTile]
+        {
+            oIO.WriteWindow(static_cast<unsigned int>(poTile->GetX()), static_cast<unsigned int>(poTile->GetY()),
+                            poTile->GetWidth(), poTile->GetHeight(), poTile->GetBuffer());
+        };
+        Line([] {}, Write);
     };
     oTarget->SetMask(std::make_unique<TileGatherer>(oLevel.moBounds, oIO.GetTileWidth(), oIO.GetTileHeight(), 1,
                                                     krv::gobs::eDT_8U, Store));
@@ -281,51 +310,111 @@ void OverviewBuilder::MakeReducers()
         moReducers.push_back(krv::gobs::MakeAverageCascade(moForm, oCascade, moBounds, moOptions.mbHalfValid));
 }
 
-void OverviewBuilder::ReadWindow(const PixelBounds& oBounds)
+void OverviewBuilder::StoreTile(SplitWriter& oSplit, std::shared_ptr<const Raster> poTile)
 {
-    Raster oRaster({oBounds.GetWidth(), oBounds.GetHeight(), moForm.mnChannels, moForm.moType},
-                   {static_cast<int>(oBounds.mnLeft), static_cast<int>(oBounds.mnTop)});
-    moWriter.ReadRaster(&oRaster);
-    const unsigned char* const pValid = moForm.mbValidity ? moValidity.Mark(oRaster) : nullptr;
-    for (const auto& oReducer : moReducers)
-        oReducer->Add({oBounds, oRaster.GetBuffer(), pValid, moValidity.GetRows()});
-    mnDone += std::uint64_t{oBounds.GetWidth()} * oBounds.GetHeight();
+    using Encoded = std::shared_ptr<const SplitWriter::Encoded>;
+    const auto poEncoded = std::make_shared<Encoded>();
+    Line([&oSplit, poEncoded, poTile] { *poEncoded = oSplit.Encode(poTile); },
+         [&oSplit, poEncoded] { oSplit.Store(**poEncoded); });
 }
 
-bool OverviewBuilder::ReadBand(unsigned int nTop, unsigned int nBottom)
+// What goes to the file does so in this order.
+void OverviewBuilder::Line(std::function<void()> oWork, std::function<void()> oTake)
 {
-    for (unsigned int nLeft = moBounds.mnLeft; nLeft < moBounds.mnRight;)
-    {
-        const std::uint64_t nRight = (std::uint64_t{nLeft} / mnWindowWidth + 1) * mnWindowWidth;
-        const bool bWhole = mnWindowWidth == moBounds.GetWidth();
-        const PixelBounds oWindow{nLeft, nTop,
-                                  bWhole ? moBounds.mnRight
-                                         : static_cast<unsigned int>(std::min<std::uint64_t>(nRight, moBounds.mnRight)),
-                                  nBottom};
-        ReadWindow(oWindow);
-        if (moOptions.moProgress && !moOptions.moProgress(mnDone, mnTotal))
-            return false;
-        nLeft = oWindow.mnRight;
-    }
-    return true;
+    moEncoding.Add(std::move(oWork), std::move(oTake));
+    while (moEncoding.GetCount() >= moThreads.GetAhead())
+        moEncoding.TakeNext();
 }
 
-// Bands end with the rows of tiles, unless these are too high.
-bool OverviewBuilder::Run()
+void OverviewBuilder::Ask() const
+{
+    if (moOptions.moProgress && !moOptions.moProgress(mnDone, mnTotal))
+        throw Stopped();
+}
+
+// Row by row. They end with the rows of tiles, unless these are too high.
+std::vector<PixelBounds> OverviewBuilder::ListWindows() const
 {
     const std::uint64_t nRowBytes = std::max<std::uint64_t>(1, mnWindowWidth * moForm.GetPixelBytes());
     const std::uint64_t nMostRows = std::max<std::uint64_t>(1, WINDOW_BYTES / nRowBytes);
     const std::uint64_t nTileHeight = std::max(moWriter.GetTileHeight(), 1U);
-    for (unsigned int nTop = moBounds.mnTop; nTop < moBounds.mnBottom;)
+    const bool bWhole = mnWindowWidth == moBounds.GetWidth();
+    std::vector<PixelBounds> oWindows;
+    for (PixelBounds oWindow = moBounds; oWindow.mnTop < moBounds.mnBottom; oWindow.mnTop = oWindow.mnBottom)
     {
-        const std::uint64_t nTileEnd = (nTop / nTileHeight + 1) * nTileHeight;
-        const auto nBottom = static_cast<unsigned int>(
-            std::min<std::uint64_t>({nTileEnd, nTop + nMostRows, std::uint64_t{moBounds.mnBottom}}));
-        if (!ReadBand(nTop, nBottom))
-            return false;
-        nTop = nBottom;
+        const std::uint64_t nTileEnd = (oWindow.mnTop / nTileHeight + 1) * nTileHeight;
+        oWindow.mnBottom = static_cast<unsigned int>(
+            std::min<std::uint64_t>({nTileEnd, oWindow.mnTop + nMostRows, std::uint64_t{moBounds.mnBottom}}));
+        for (oWindow.mnLeft = moBounds.mnLeft; oWindow.mnLeft < moBounds.mnRight; oWindow.mnLeft = oWindow.mnRight)
+        {
+            const std::uint64_t nEnd =
+                bWhole ? moBounds.mnRight : (std::uint64_t{oWindow.mnLeft} / mnWindowWidth + 1) * mnWindowWidth;
+            oWindow.mnRight = static_cast<unsigned int>(std::min<std::uint64_t>(nEnd, moBounds.mnRight));
+            oWindows.push_back(oWindow);
+        }
     }
+    return oWindows;
+}
+
+WindowPointer OverviewBuilder::Read(IRasterReader& oReader, const SourceForm& oForm, const PixelBounds& oBounds)
+{
+    auto poWindow = std::make_unique<Raster>(
+        krv::gobs::RasterInfo(oBounds.GetWidth(), oBounds.GetHeight(), oForm.mnChannels, oForm.moType),
+        krv::gobs::RasterContext(static_cast<int>(oBounds.mnLeft), static_cast<int>(oBounds.mnTop)));
+    oReader.ReadRaster(poWindow.get());
+    return poWindow;
+}
+
+void OverviewBuilder::Take(const WindowPointer& poWindow, const PixelBounds& oBounds)
+{
+    const unsigned char* const pValid = moForm.mbValidity ? moValidity.Mark(*poWindow) : nullptr;
+    for (const auto& oReducer : moReducers)
+        oReducer->Add({oBounds, poWindow->GetBuffer(), pValid, moValidity.GetRows()});
+    mnDone += std::uint64_t{oBounds.GetWidth()} * oBounds.GetHeight();
+    Ask();
+}
+
+// Windows are read by all threads, and reduced by this one in their order.
+void OverviewBuilder::TakeAll(const std::vector<PixelBounds>& oWindows)
+{
+    using Reader = std::shared_ptr<IRasterReader>;
+    const auto Make = [this]
+    {
+        Reader poReader =
+            moOptions.moMakeReader && moOptions.mpoExecutor != nullptr ? moOptions.moMakeReader() : nullptr;
+        return poReader != nullptr ? std::make_unique<Reader>(std::move(poReader)) : nullptr;
+    };
+    krv::threading::StateStore<Reader> oReaders(Make);
+    auto poFirst = Make();
+    if (poFirst == nullptr)
+    {
+        for (const PixelBounds& oBounds : oWindows)
+            Take(Read(moWriter, moForm, oBounds), oBounds);
+        return;
+    }
+    oReaders.Add(std::move(poFirst));
+    std::size_t nTaken = 0;
+    krv::threading::ForEachItem(
+        moThreads, oWindows.size(),
+        [&](std::uint64_t nWindow)
+        {
+            const krv::threading::StateStore<Reader>::Use oReader(oReaders);
+            return Read(**oReader, moForm, oWindows[nWindow]);
+        },
+        [&](const WindowPointer& poWindow) { Take(poWindow, oWindows[nTaken++]); }, krv::threading::TaskOrder::eAsAdded,
+        MOST_AHEAD_BYTES / WINDOW_BYTES);
+}
+
+bool OverviewBuilder::Run()
+try
+{
+    TakeAll(ListWindows());
+    moEncoding.TakeAll();
     return true;
+}
+catch (const Stopped&)
+{
+    return false;
 }
 
 void OverviewBuilder::Finish()
@@ -335,6 +424,7 @@ void OverviewBuilder::Finish()
     {
         oLevel.mpoTarget.reset();
         oLevel.mpoMaskIO.reset();
+        oLevel.mpoSplit.reset();
         oLevel.mpoWriter.reset();
         if (mnMask != 0)
             mpoMaskManager->SetValid(mnMask, oLevel.mnFactor, true);

@@ -5,6 +5,7 @@
 
 #include <cstdint>
 #include <functional>
+#include <memory>
 #include <optional>
 #include <string>
 #include <vector>
@@ -14,9 +15,15 @@ namespace krv::gobs
 class IMaskBuilder;
 }
 
+namespace krv::threading
+{
+class IExecutor;
+}
+
 namespace krv::datasources
 {
 
+class IRasterReader;
 class IRasterWriter;
 
 using krv::gobs::GetResamplingName;
@@ -51,11 +58,18 @@ struct OverviewOptions
     std::function<bool(std::uint64_t nDone, std::uint64_t nTotal)> moProgress;
     // Which pixels are valid (set bits), instead of what the dataset says. Borrowed. No mask levels are made then.
     const krv::gobs::IMaskBuilder* mpoValidity = nullptr;
+    // Whose threads encode levels and, with readers of their own, read the image; borrowed. Null: the calling one does
+    // all. Levels are the same, byte for byte.
+    krv::threading::IExecutor* mpoExecutor = nullptr;
+    // Makes a reader of just the pixels that the writer would read, over a dataset of its own, for one thread. Called
+    // by any thread. Null: there can be no more. Without it the writer reads.
+    std::function<std::shared_ptr<IRasterReader>()> moMakeReader;
 };
 
 // Builds levels (reduction factors from 2 on) of the writer's channels in one pass over the image, each as if it were
 // made from the full resolution. Levels that do not exist are created, those of another size than above made anew.
-// Memory: about the width of the image times the height of a tile for each level.
+// Memory: about the width of the image times the height of a tile for each level, and a few windows of the image for
+// each thread.
 //
 // Valid is a sample when ValiditySource says so of its pixel (no-data, mask bitmap and alpha of the dataset, which the
 // writer shows by IDatasetAccess; of one that does not, no-data and alpha of its own channels, and a warning is given)

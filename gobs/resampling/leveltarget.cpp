@@ -57,10 +57,10 @@ unsigned char* TileGatherer::FindTile(unsigned int nX, unsigned int nY, unsigned
 void TileGatherer::StoreLast()
 {
     const PixelBounds oPart = mpoLast->moPart;
-    const std::unique_ptr<Raster> oRaster = std::move(mpoLast->mpoRaster);
+    std::unique_ptr<Raster> oRaster = std::move(mpoLast->mpoRaster);
     mpoLast = nullptr;
     moTiles.erase({oPart.mnTop / mnTileHeight, oPart.mnLeft / mnTileWidth});
-    moStore(*oRaster);
+    moStore(std::move(oRaster));
 }
 
 void TileGatherer::Put(unsigned int nX, unsigned int nY, unsigned int nCount, const unsigned char* pPixels)

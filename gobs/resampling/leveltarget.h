@@ -19,7 +19,7 @@ namespace krv::gobs
 class KRV_GOBS_API TileGatherer
 {
 public:
-    using Store = std::function<void(const Raster& oTile)>;
+    using Store = std::function<void(std::unique_ptr<Raster> poTile)>;
 
     TileGatherer(const PixelBounds& oBounds, unsigned int nTileWidth, unsigned int nTileHeight, unsigned int nChannels,
                  const DataType& oType, Store oStore);

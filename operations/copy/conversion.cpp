@@ -6,6 +6,7 @@
 #include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/reader/basicreader.h"
+#include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/writer/basicwriter.h"
 #include "gobs/pct/pct.h"
 #include "operations/copy/detail/copylevels.h"
@@ -148,34 +149,41 @@ void CopyChannels(const CopyPlan& oPlan, const Target& oTarget)
             {
                 oKeys.push_back(oKey);
                 oRead.emplace_back();
-                oSources.emplace_back();
+                oSources.emplace_back().file = &oPlan.GetSource(oKey.first);
             }
             oRead[nAt].push_back(oChannels[i].channel);
             oSources[nAt].positions.push_back(static_cast<unsigned int>(oWritten.size()));
             oWritten.push_back(static_cast<unsigned int>(i) + 1);
         }
-        std::vector<LevelReader> oReaders;
         for (std::size_t nAt = 0; nAt < oKeys.size(); ++nAt)
-            oReaders.push_back(oPlan.GetSource(oKeys[nAt].first).Read(oRead[nAt]));
-        for (std::size_t nAt = 0; nAt < oKeys.size(); ++nAt)
-            oSources[nAt].reader = &oReaders[nAt].Get();
+            oSources[nAt].open = [oChannelList = oRead[nAt]](const SourceFile& oFile)
+            {
+                return oFile.Read(oChannelList);
+            };
         BasicWriter oWriter(&oTarget.GetRaster(), oWritten);
-        CopyPixels(oSources, oWriter, oPlan.GetWindow(), oCounter);
+        CopyPixels(oSources, {oWriter}, oPlan.GetWindow(), oCounter, oTarget.GetExecutor());
     }
 }
 
-unsigned int CopyBitmap(IBitmapDataset& oFrom, unsigned int nFrom, IBitmapDataset& oTo, const PixelWindow& oWindow,
-                        const Progress& oProgress)
+unsigned int CopyBitmap(const SourceFile& oSource, unsigned int nFrom, const Target& oTarget,
+                        const PixelWindow& oWindow)
 {
+    const auto& oFrom = dynamic_cast<const IBitmapDataset&>(oSource.GetDataset());
+    IBitmapDataset& oTo = *oTarget.Find<IBitmapDataset>();
     const unsigned int nTo = oTo.CreateBitmap();
     oTo.SetBitmapDescription(nTo, oFrom.GetBitmapDescription(nFrom));
     const MetadataMap oTags = oFrom.GetBitmapMetadata(nFrom);
     if (!oTags.empty())
         oTo.SetBitmapMetadata(nTo, oTags);
-    BasicReader oReader(&oFrom, {nFrom}, false);
+    const auto Open = [nFrom](const SourceFile& oFile)
+    {
+        auto& oBitmaps = dynamic_cast<IBitmapDataset&>(oFile.GetDataset());
+        return LevelReader(std::make_unique<BasicReader>(&oBitmaps, std::vector<unsigned int>{nFrom}, false), nullptr,
+                           nullptr);
+    };
     BasicWriter oWriter(&oTo, {nTo});
-    ProgressCounter oCounter(oProgress, "bitmap", std::uint64_t{oWindow.width} * oWindow.height);
-    CopyPixels({{&oReader, {0}}}, oWriter, oWindow, oCounter);
+    ProgressCounter oCounter(oTarget.GetProgress(), "bitmap", std::uint64_t{oWindow.width} * oWindow.height);
+    CopyPixels({{&oSource, Open, {0}}}, {oWriter}, oWindow, oCounter, oTarget.GetExecutor());
     return nTo;
 }
 
@@ -198,7 +206,7 @@ BitmapNumbers CopyBitmaps(const CopyPlan& oPlan, const Target& oTarget)
             continue;
         }
         for (const unsigned int nBitmap : oList)
-            oNumbers[nBitmap] = CopyBitmap(*poFrom, nBitmap, *poTo, oPlan.GetWindow(), oTarget.GetProgress());
+            oNumbers[nBitmap] = CopyBitmap(oPlan.GetSource(s), nBitmap, oTarget, oPlan.GetWindow());
     }
     return oNumbers;
 }
@@ -222,12 +230,13 @@ bool HasLevels(const SourceFile& oSource)
 
 } // namespace
 
-void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress)
+void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress,
+             krv::threading::IExecutor* poExecutor)
 {
     CheckTarget(oRequest, oForm.name);
     const CopyPlan oPlan(oRequest);
     WarnOfFurtherImages(oPlan);
-    const Target oTarget(oPlan, oForm, oProgress);
+    const Target oTarget(oPlan, oForm, oProgress, poExecutor);
     // What a codec changes says nothing of validity any more: a mask does.
     const bool bPixelsChange = oTarget.IsLossy() && !oTarget.TakesBlocks();
     const bool bMask = bPixelsChange && HasValidityInValues(oPlan);

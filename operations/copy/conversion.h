@@ -8,6 +8,11 @@
 #include <string>
 #include <vector>
 
+namespace krv::threading
+{
+class IExecutor;
+}
+
 namespace krv::operations
 {
 
@@ -36,15 +41,18 @@ struct TargetForm
     std::string name;
     std::string format;  // short name; empty: by the name's extension, else TIF
     std::string options; // as the format takes them
+    bool check = false;  // decode blocks that move as bytes: what is damaged is not passed on
 };
 
 // Copies channels of one or several files of one size into a new file: pixels, metadata, geocoding, reference system,
 // sensor models, colour tables, bitmaps and levels; with the option LAYOUT=COG levels are built when there are none.
 // What the options leave open stays as the first file has it: codec, predictor, blocks and interleaving; a whole image
-// is copied block by block as it is stored. Pixels are never encoded with loss unless the options ask for it, and then
-// a mask says which are valid. Warns of what the target's format cannot hold. A file of that name is replaced when the
-// copy is complete; on a failure, and when the user stops it, nothing changes. Throws RequestException for what makes
-// no sense, DataException when the target is one of the sources or no plain file, and what formats throw.
-KRV_OPERATIONS_API void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress = {});
+// is copied block by block as it is stored, without being decoded. Pixels are never encoded with loss unless the
+// options ask for it, and then a mask says which are valid. Warns of what the target's format cannot hold. A file of
+// that name is replaced when the copy is complete; on a failure, and when the user stops it, nothing changes. The copy
+// is the same, byte for byte, for any number of threads. Throws RequestException for what makes no sense, DataException
+// when the target is one of the sources or no plain file, and what formats throw.
+KRV_OPERATIONS_API void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress = {},
+                                krv::threading::IExecutor* poExecutor = nullptr);
 
 } // namespace krv::operations

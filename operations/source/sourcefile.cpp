@@ -123,7 +123,7 @@ SourceFile::SourceFile(const std::string& name, AccessMode eMode)
 
 SourceFile::~SourceFile() = default;
 
-std::unique_ptr<SourceFile> SourceFile::OpenAgain() const
+std::unique_ptr<SourceFile> SourceFile::OpenAgain(bool bUpdated) const
 {
     if (moIdentity.mnNode == 0)
         return nullptr;
@@ -132,15 +132,30 @@ std::unique_ptr<SourceFile> SourceFile::OpenAgain() const
         auto poAgain = std::make_unique<SourceFile>(moName);
         // What this process writes into a file that it updates changes size and time, not what is opened.
         const Identity oNow(moName);
-        const bool bSame = meMode == eReadOnly
-                               ? poAgain->moIdentity == moIdentity && oNow == moIdentity
-                               : oNow.mnNode == moIdentity.mnNode && oNow.mnDevice == moIdentity.mnDevice;
+        const bool bSame = bUpdated || meMode == eUpdate
+                               ? oNow.mnNode == moIdentity.mnNode && oNow.mnDevice == moIdentity.mnDevice
+                               : poAgain->moIdentity == moIdentity && oNow == moIdentity;
         return bSame ? std::move(poAgain) : nullptr;
     }
     catch (const krv::Exception&)
     {
         return nullptr;
     }
+}
+
+std::shared_ptr<IRasterReader> SourceFile::ReadAgain(const std::vector<unsigned int>& oChannels, bool bUpdated) const
+{
+    struct Held
+    {
+        std::unique_ptr<SourceFile> file;
+        LevelReader reader;
+    };
+    std::unique_ptr<SourceFile> poAgain = OpenAgain(bUpdated);
+    if (poAgain == nullptr)
+        return nullptr;
+    LevelReader oReader = poAgain->Read(oChannels);
+    const auto poHeld = std::make_shared<Held>(std::move(poAgain), std::move(oReader));
+    return {poHeld, &poHeld->reader.Get()};
 }
 
 krv::datasources::IRasterDataset& SourceFile::GetRaster() const

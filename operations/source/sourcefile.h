@@ -71,8 +71,12 @@ public:
     ~SourceFile();
 
     // The same file opened once more for reading, for a thread of its own; null when that cannot be: it is another by
-    // now, or nobody else can open it. Of a file that is open for updating it shows the state on the disk. Any thread.
-    std::unique_ptr<SourceFile> OpenAgain() const;
+    // now, or nobody else can open it. bUpdated: this process updates it meanwhile, which changes nothing of what is
+    // read; so it is of a file opened for updating, of which this shows the state on the disk. Any thread.
+    std::unique_ptr<SourceFile> OpenAgain(bool bUpdated = false) const;
+    // A reader over the file opened again, which goes with it; null when that cannot be. Any thread.
+    std::shared_ptr<krv::datasources::IRasterReader> ReadAgain(const std::vector<unsigned int>& oChannels,
+                                                               bool bUpdated = false) const;
 
     const std::string& GetName() const { return moName; }
     krv::datasources::IDataset& GetDataset() const { return *mpoDataset; }

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/iblockencoding.h"
 #include "datasources/interfaces/iencodedblocks.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
@@ -38,7 +39,8 @@ class TifDataset : public support::Dataset,
                    public krv::datasources::IMathModelDataset,
                    public krv::datasources::IStorageDataset,
                    public krv::datasources::IPagedDataset,
-                   public krv::datasources::IEncodedBlocks
+                   public krv::datasources::IEncodedBlocks,
+                   public krv::datasources::IBlockEncoding
 {
 public:
     // Throws krv::FileException kinds that name file and cause; nothing stays open then.
@@ -107,6 +109,7 @@ public:
     bool SetEncodedForm(unsigned int nLevel, const krv::datasources::EncodedForm& oForm) override;
     void StoreEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock, const unsigned char* pBytes,
                       std::size_t nBytes) override;
+    krv::datasources::IBlockEncoder* MakeBlockEncoder(unsigned int nLevel) override;
 
 private:
     class Levels;
@@ -150,7 +153,7 @@ private:
     void Complain(const std::string& trouble) const;
     // What a level's page is known by, and the page as its blocks are read.
     std::uint64_t FindLevelPage(unsigned int nLevel, const Place& oPlace) const;
-    Page& GetCodedPage(unsigned int nLevel, const Place& oPlace);
+    std::shared_ptr<Page> GetCodedPage(unsigned int nLevel, const Place& oPlace);
 
     std::unique_ptr<support::LevelStore> mpoLevels;
     std::unique_ptr<support::LevelStore> mpoMaskLevels;

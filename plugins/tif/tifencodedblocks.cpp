@@ -1,6 +1,7 @@
-// The blocks of a TIFF file as bytes: the facet IEncodedBlocks of its dataset.
+// The blocks of a TIFF file as bytes: the facets IEncodedBlocks and IBlockEncoding of its dataset.
 #include "plugins/tif/reading/pagesource.h"
 #include "plugins/tif/tifdataset.h"
+#include "plugins/tif/writing/blockencoder.h"
 #include "plugins/tif/writing/encodedform.h"
 #include "plugins/tif/writing/pagewriter.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -12,18 +13,6 @@ namespace krv::plugins::tif
 
 namespace
 {
-
-std::uint64_t GetStrile(const PageForm& oForm, const krv::datasources::BlockNumber& oBlock, const Page& oPage,
-                        const Place& oPlace)
-{
-    if (oBlock.mnPlane >= oForm.GetPlanes() || oBlock.mnColumn >= oForm.mnStrilesAcross ||
-        oBlock.mnRow >= oForm.mnStrilesDown)
-        throw DataException(oPage.GetFileName() + ": there is no block " + std::to_string(oBlock.mnColumn) + ", " +
-                                std::to_string(oBlock.mnRow) + " of plane " + std::to_string(oBlock.mnPlane),
-                            oPlace);
-    return (std::uint64_t{oBlock.mnPlane} * oForm.mnStrilesDown + oBlock.mnRow) * oForm.mnStrilesAcross +
-           oBlock.mnColumn;
-}
 
 // Whether the sides of an image and of its level are those of the level's number.
 bool IsReduced(std::uint64_t nFull, std::uint64_t nReduced, unsigned int nLevel)
@@ -47,32 +36,32 @@ std::uint64_t TifDataset::FindLevelPage(unsigned int nLevel, const Place& oPlace
     Refuse("level " + std::to_string(nLevel) + " does not exist", oPlace);
 }
 
-Page& TifDataset::GetCodedPage(unsigned int nLevel, const Place& oPlace)
+std::shared_ptr<Page> TifDataset::GetCodedPage(unsigned int nLevel, const Place& oPlace)
 {
     const std::uint64_t nPage = FindLevelPage(nLevel, oPlace);
     if (nLevel == 1)
-        return *mpoPage;
+        return mpoPage;
     std::shared_ptr<Page>& poPage = moCodedPages[nPage];
     if (!poPage)
         poPage = mpoEditor ? mpoEditor->OpenPage(mpoEditor->GetPage(nPage))
                            : std::make_shared<Page>(mpoFile, mpoPage->GetHeader(), nPage);
-    return *poPage;
+    return poPage;
 }
 
 krv::datasources::EncodedForm TifDataset::GetEncodedForm(unsigned int nLevel)
 {
-    return DescribeBlocks(GetCodedPage(nLevel, Place::Current()));
+    return DescribeBlocks(*GetCodedPage(nLevel, Place::Current()));
 }
 
 bool TifDataset::ReadEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock,
                              std::vector<unsigned char>& oBytes)
 {
     const Place oPlace = Place::Current();
-    Page& oPage = GetCodedPage(nLevel, oPlace);
+    Page& oPage = *GetCodedPage(nLevel, oPlace);
     const PageForm& oForm = oPage.GetForm();
     if (mpoEditor)
         mpoEditor->StoreHeld();
-    const Strile oStrile = oPage.GetStriles().Get(GetStrile(oForm, oBlock, oPage, oPlace));
+    const Strile oStrile = oPage.GetStriles().Get(GetStrile(oPage, oBlock, oPlace));
     oBytes.clear();
     if (oStrile.mnBytes == 0)
         return false;
@@ -130,8 +119,8 @@ void TifDataset::StoreEncoded(unsigned int nLevel, const krv::datasources::Block
     const Place oPlace = Place::Current();
     GetEditor("blocks cannot be written", oPlace);
     const std::uint64_t nNumber = FindLevelPage(nLevel, oPlace);
-    Page& oPage = GetCodedPage(nLevel, oPlace);
-    const std::uint64_t nStrile = GetStrile(oPage.GetForm(), oBlock, oPage, oPlace);
+    Page& oPage = *GetCodedPage(nLevel, oPlace);
+    const std::uint64_t nStrile = GetStrile(oPage, oBlock, oPlace);
     if (pBytes == nullptr || nBytes == 0)
         Refuse("a block without bytes cannot be stored", oPlace);
     support::BlockImage& oImage = nLevel == 1 ? *GetImage(oPlace) : *OpenPage(nNumber, PixelUse::eImage);
@@ -140,6 +129,24 @@ void TifDataset::StoreEncoded(unsigned int nLevel, const krv::datasources::Block
         Refuse("blocks of this image are only read", oPlace);
     poWriter->StoreCoded(nStrile, pBytes, nBytes);
     oImage.DropBlocks();
+}
+
+krv::datasources::IBlockEncoder* TifDataset::MakeBlockEncoder(unsigned int nLevel)
+{
+    const Place oPlace = Place::Current();
+    FileEditor& oEditor = GetEditor("blocks cannot be encoded", oPlace);
+    oEditor.StoreHeld();
+    const std::shared_ptr<Page> poPage = GetCodedPage(nLevel, oPlace);
+    const auto& oCounts = oEditor.GetPage(FindLevelPage(nLevel, oPlace), oPlace)->moByteCounts;
+    const auto oStored = std::find_if(oCounts.begin(), oCounts.end(), [](std::uint64_t nBytes) { return nBytes != 0; });
+    std::vector<unsigned char> oLike;
+    if (oStored != oCounts.end())
+    {
+        const Strile oStrile = poPage->GetStriles().Get(static_cast<std::uint64_t>(oStored - oCounts.begin()));
+        oLike.resize(std::min<std::uint64_t>(oStrile.mnBytes, JpegEncoder::FORM_BYTES));
+        oLike.resize(poPage->GetFile().ReadUpTo(oStrile.mnOffset, oLike.data(), oLike.size()));
+    }
+    return BlockEncoder::Make(poPage, oEditor.GetOptions().moLevel, std::move(oLike)).release();
 }
 
 } // namespace krv::plugins::tif

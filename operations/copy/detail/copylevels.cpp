@@ -12,12 +12,15 @@
 #include "operations/copy/detail/copypixels.h"
 #include "operations/copy/detail/keptform.h"
 #include "operations/job/progress.h"
+#include "operations/source/fileworkers.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/threading/foreachitem.h"
 
 #include <fmt/format.h>
 
 #include <algorithm>
 #include <memory>
+#include <numeric>
 
 namespace krv::operations::detail
 {
@@ -49,13 +52,92 @@ PixelWindow GetPart(const EncodedForm& oForm, const BlockNumber& oBlock)
             std::min(oForm.mnBlockHeight, oForm.mnHeight - nY)};
 }
 
-// Reads pixels and drops them: what is damaged throws.
-void CheckPixels(IRasterReader& oReader, const PixelWindow& oPart)
+// The blocks of an image in their order, in runs that are worth a task.
+class BlockGrid
 {
-    krv::gobs::Raster oPixels({oPart.width, oPart.height, oReader.GetChansCount(), oReader.GetDataType()},
-                              {static_cast<int>(oPart.x), static_cast<int>(oPart.y)});
-    oReader.ReadRaster(&oPixels);
-}
+public:
+    explicit BlockGrid(const EncodedForm& oForm)
+        : mnColumns(DivideUp(oForm.mnWidth, oForm.mnBlockWidth)), mnRows(DivideUp(oForm.mnHeight, oForm.mnBlockHeight)),
+          mnBlocks(std::uint64_t{oForm.mbSeparate ? oForm.mnChannels : 1} * mnColumns * mnRows)
+    {
+        const std::uint64_t nBytes = std::uint64_t{oForm.mnBlockWidth} * oForm.mnBlockHeight;
+        mnRun = std::clamp<std::uint64_t>(RUN_PIXELS / std::max<std::uint64_t>(nBytes, 1), 1, MOST_RUN);
+    }
+
+    std::uint64_t CountRuns() const { return (mnBlocks + mnRun - 1) / mnRun; }
+
+    std::vector<BlockNumber> GetRun(std::uint64_t nRun) const
+    {
+        std::vector<BlockNumber> oBlocks;
+        for (std::uint64_t n = nRun * mnRun; n < std::min(mnBlocks, (nRun + 1) * mnRun); ++n)
+            oBlocks.push_back({static_cast<unsigned int>(n / mnColumns / mnRows),
+                               static_cast<unsigned int>(n % mnColumns),
+                               static_cast<unsigned int>(n / mnColumns % mnRows)});
+        return oBlocks;
+    }
+
+private:
+    static constexpr std::uint64_t RUN_PIXELS = std::uint64_t{1} << 20;
+    static constexpr std::uint64_t MOST_RUN = 64;
+
+    std::uint64_t mnColumns;
+    std::uint64_t mnRows;
+    std::uint64_t mnBlocks;
+    std::uint64_t mnRun;
+};
+
+// A block on its way from file to file.
+struct MovedBlock
+{
+    BlockNumber number;
+    std::uint64_t pixelBytes;
+    bool stored;
+    std::vector<unsigned char> bytes;
+};
+
+// What a thread fetches blocks with.
+class BlockReader
+{
+public:
+    BlockReader(FilePointer poFile, const EncodedForm& oForm, unsigned int nLevel, bool bCheck)
+        : mpoFile(std::move(poFile)), moForm(oForm), mnLevel(nLevel),
+          moBlocks(dynamic_cast<IEncodedBlocks&>(mpoFile->GetDataset()))
+    {
+        std::vector<unsigned int> oAll(oForm.mnChannels);
+        std::iota(oAll.begin(), oAll.end(), 1U);
+        if (bCheck && !oForm.mbSeparate)
+            moPlanes.push_back(mpoFile->Read(oAll, nLevel));
+        for (const unsigned int nChannel : bCheck&& oForm.mbSeparate ? oAll : std::vector<unsigned int>())
+            moPlanes.push_back(mpoFile->Read({nChannel}, nLevel));
+    }
+
+    MovedBlock Read(const BlockNumber& oBlock)
+    {
+        const PixelWindow oPart = GetPart(moForm, oBlock);
+        const unsigned int nChannels = moForm.mbSeparate ? 1 : moForm.mnChannels;
+        MovedBlock oMoved{
+            oBlock, krv::gobs::BufferBytes(oPart.width, oPart.height, nChannels, moForm.moType), false, {}};
+        oMoved.stored = moBlocks.ReadEncoded(mnLevel, oBlock, oMoved.bytes);
+        if (oMoved.stored && !moPlanes.empty())
+            CheckPixels(moPlanes[oBlock.mnPlane].Get(), oPart);
+        return oMoved;
+    }
+
+private:
+    // Reads pixels and drops them: what is damaged throws.
+    static void CheckPixels(IRasterReader& oReader, const PixelWindow& oPart)
+    {
+        krv::gobs::Raster oPixels({oPart.width, oPart.height, oReader.GetChansCount(), oReader.GetDataType()},
+                                  {static_cast<int>(oPart.x), static_cast<int>(oPart.y)});
+        oReader.ReadRaster(&oPixels);
+    }
+
+    FilePointer mpoFile;
+    const EncodedForm& moForm;
+    unsigned int mnLevel;
+    IEncodedBlocks& moBlocks;
+    std::vector<LevelReader> moPlanes; // that are decoded, too; none when nothing is
+};
 
 // Of one bitmap at a level, pixel for pixel.
 void CopyMaskLevel(IRasterIO& oFrom, IRasterIO& oTo)
@@ -136,17 +218,20 @@ private:
 
     void CopyValues(unsigned int nLevel) const
     {
-        const LevelReader oReader = moSource.Read(moChannels, nLevel);
         BasicOverviewWriterAccessor oAccessor(&moTarget.GetRaster(), moChannels);
         const std::unique_ptr<IRasterWriter> poWriter(oAccessor.CreateRasterWriter(nLevel));
-        const PixelWindow oAll{0, 0, oReader.Get().GetWidth(), oReader.Get().GetHeight()};
+        const PixelWindow oAll{0, 0, poWriter->GetWidth(), poWriter->GetHeight()};
         std::vector<unsigned int> oPositions(moChannels.size());
         for (unsigned int nAt = 0; nAt < oPositions.size(); ++nAt)
             oPositions[nAt] = nAt;
         ProgressCounter oCounter(
             moTarget.GetProgress(), "overviews",
             krv::gobs::BufferBytes(oAll.width, oAll.height, poWriter->GetChansCount(), poWriter->GetDataType()));
-        CopyPixels({{&oReader.Get(), oPositions}}, *poWriter, oAll, oCounter);
+        const auto Open = [this, nLevel](const SourceFile& oFile)
+        {
+            return oFile.Read(moChannels, nLevel);
+        };
+        CopyPixels({{&moSource, Open, oPositions}}, {*poWriter, nLevel}, oAll, oCounter, moTarget.GetExecutor());
     }
 
     const CopyPlan& moPlan;
@@ -198,7 +283,10 @@ std::string ChooseMethod(const Target& oTarget, const std::string& own)
     return bIndexed ? "mode" : "average";
 }
 
-void BuildLevels(const Target& oTarget, const std::vector<unsigned int>& oLevels, const std::string& method)
+// The source's pixels are read in place of the target's where they are the same: others than its own thread can open
+// it.
+void BuildLevels(const CopyPlan& oPlan, const Target& oTarget, const std::vector<unsigned int>& oLevels,
+                 const std::string& method)
 {
     if (oLevels.empty())
         return;
@@ -210,6 +298,12 @@ void BuildLevels(const Target& oTarget, const std::vector<unsigned int>& oLevels
         Report(oTarget.GetProgress(), {"overviews", nDone * nPixelBytes, nTotal * nPixelBytes});
         return true;
     };
+    oOptions.mpoExecutor = oTarget.GetExecutor();
+    if (oPlan.IsWholeFile() && !oPlan.IsCut() && oPlan.AreTypesKept() && (oTarget.TakesBlocks() || !oTarget.IsLossy()))
+        oOptions.moMakeReader = [&oPlan]
+        {
+            return oPlan.GetSource(0).ReadAgain(AllChannels(oPlan));
+        };
     BuildOverviews(oWriter, oLevels, method, oOptions);
 }
 
@@ -218,33 +312,35 @@ void BuildLevels(const Target& oTarget, const std::vector<unsigned int>& oLevels
 void MoveBlocks(const CopyPlan& oPlan, const Target& oTarget, unsigned int nLevel)
 {
     const SourceFile& oSource = oPlan.GetSource(0);
-    auto& oFrom = dynamic_cast<IEncodedBlocks&>(oSource.GetDataset());
     IEncodedBlocks& oTo = *oTarget.Find<IEncodedBlocks>();
-    const EncodedForm oForm = oFrom.GetEncodedForm(nLevel);
+    const EncodedForm oForm = dynamic_cast<IEncodedBlocks&>(oSource.GetDataset()).GetEncodedForm(nLevel);
+    const BlockGrid oGrid(oForm);
     ProgressCounter oCounter(oTarget.GetProgress(), nLevel == 1 ? "convert" : "overviews",
                              krv::gobs::BufferBytes(oForm.mnWidth, oForm.mnHeight, oForm.mnChannels, oForm.moType));
-    std::vector<unsigned char> oBytes;
-    const unsigned int nPlanes = oForm.mbSeparate ? oForm.mnChannels : 1;
-    const unsigned int nColumns = DivideUp(oForm.mnWidth, oForm.mnBlockWidth);
-    const unsigned int nRows = DivideUp(oForm.mnHeight, oForm.mnBlockHeight);
-    for (unsigned int nPlane = 0; nPlane < nPlanes; ++nPlane)
-    {
-        const LevelReader oReader =
-            oSource.Read(oForm.mbSeparate ? std::vector<unsigned int>{nPlane + 1} : AllChannels(oPlan), nLevel);
-        for (unsigned int nRow = 0; nRow < nRows; ++nRow)
-            for (unsigned int nColumn = 0; nColumn < nColumns; ++nColumn)
+    const bool bCheck = oTarget.IsChecked() && oForm.moCodec != "NONE";
+    FileWorkers<BlockReader> oWorkers(
+        oSource,
+        [&](FilePointer poFile) { return std::make_unique<BlockReader>(std::move(poFile), oForm, nLevel, bCheck); });
+    krv::threading::TaskGroup oThreads(oTarget.GetExecutor(), [&oCounter] { oCounter.Repeat(); });
+    krv::threading::ForEachItem(
+        oThreads, oGrid.CountRuns(),
+        [&](std::uint64_t nRun)
+        {
+            const FileWorkers<BlockReader>::Use oReader(oWorkers);
+            std::vector<MovedBlock> oBlocks;
+            for (const BlockNumber& oBlock : oGrid.GetRun(nRun))
+                oBlocks.push_back(oReader->Read(oBlock));
+            return oBlocks;
+        },
+        [&](const std::vector<MovedBlock>& oBlocks)
+        {
+            for (const MovedBlock& oBlock : oBlocks)
             {
-                const BlockNumber oBlock{nPlane, nColumn, nRow};
-                const PixelWindow oPart = GetPart(oForm, oBlock);
-                oCounter.Advance(
-                    krv::gobs::BufferBytes(oPart.width, oPart.height, oReader.Get().GetChansCount(), oForm.moType));
-                if (!oFrom.ReadEncoded(nLevel, oBlock, oBytes))
-                    continue;
-                if (oForm.moCodec != "NONE")
-                    CheckPixels(oReader.Get(), oPart);
-                oTo.StoreEncoded(nLevel, oBlock, oBytes.data(), oBytes.size());
+                if (oBlock.stored)
+                    oTo.StoreEncoded(nLevel, oBlock.number, oBlock.bytes.data(), oBlock.bytes.size());
+                oCounter.Advance(oBlock.pixelBytes);
             }
-    }
+        });
 }
 
 void CopyLevels(const CopyPlan& oPlan, const Target& oTarget, const BitmapNumbers& oBitmaps, bool bSame, bool bWanted)
@@ -259,9 +355,9 @@ void CopyLevels(const CopyPlan& oPlan, const Target& oTarget, const BitmapNumber
     std::erase_if(oLevels,
                   [&](unsigned int nLevel) { return nLevel < 2 || nLevel >= std::max(oWindow.width, oWindow.height); });
     if (oLevels.empty())
-        return bWanted
-                   ? BuildLevels(oTarget, GetDefaultLevels(oWindow.width, oWindow.height), ChooseMethod(oTarget, ""))
-                   : void();
+        return bWanted ? BuildLevels(oPlan, oTarget, GetDefaultLevels(oWindow.width, oWindow.height),
+                                     ChooseMethod(oTarget, ""))
+                       : void();
     std::vector<unsigned int> oAnew;
     LevelCopy oCopy(oPlan, oTarget, *poTo);
     for (const unsigned int nLevel : oLevels)
@@ -278,7 +374,7 @@ void CopyLevels(const CopyPlan& oPlan, const Target& oTarget, const BitmapNumber
     if (own != method)
         Target::Warn(fmt::format("{}: levels {} are made anew by {}: the file does not say how they were made", name,
                                  fmt::join(oAnew, ", "), method));
-    oTarget.Try("levels", [&] { BuildLevels(oTarget, oAnew, method); });
+    oTarget.Try("levels", [&] { BuildLevels(oPlan, oTarget, oAnew, method); });
 }
 
 } // namespace krv::operations::detail

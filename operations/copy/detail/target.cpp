@@ -68,9 +68,10 @@ void Target::Warn(const std::string& message)
     krv::nspio::Warning::Warn(message);
 }
 
-Target::Target(const CopyPlan& oPlan, const TargetForm& oForm, const Progress& oProgress)
-    : moName(oForm.name), moFormat(ChooseFormat(oForm)), moProgress(oProgress),
-      mbNew(!std::filesystem::exists(oForm.name))
+Target::Target(const CopyPlan& oPlan, const TargetForm& oForm, const Progress& oProgress,
+               krv::threading::IExecutor* poExecutor)
+    : moName(oForm.name), moFormat(ChooseFormat(oForm)), moProgress(oProgress), mpoExecutor(poExecutor),
+      mbChecked(oForm.check), mbNew(!std::filesystem::exists(oForm.name))
 {
     if (const auto oMoved = FindMovedForm(oPlan, oForm.options))
     {

@@ -5,6 +5,7 @@
 #include "operations/copy/detail/copyplan.h"
 #include "operations/job/progress.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/threading/executor.h"
 
 #include <memory>
 #include <string>
@@ -18,7 +19,8 @@ class Target
 public:
     // Lays the file out as the user's options say and, where they are silent, as the first source is. Warns of what the
     // format does not keep of that.
-    Target(const CopyPlan& oPlan, const TargetForm& oForm, const Progress& oProgress);
+    Target(const CopyPlan& oPlan, const TargetForm& oForm, const Progress& oProgress,
+           krv::threading::IExecutor* poExecutor);
 
     template <typename Facet>
     Facet* Find() const
@@ -30,6 +32,10 @@ public:
     const std::string& GetName() const { return moName; }
     // Whom its making is told.
     const Progress& GetProgress() const { return moProgress; }
+    // Whose threads take part; may be null.
+    krv::threading::IExecutor* GetExecutor() const { return mpoExecutor; }
+    // Whether blocks that move as bytes are decoded, too.
+    bool IsChecked() const { return mbChecked; }
 
     // Whether the blocks of the image are to come from the source as bytes.
     bool TakesBlocks() const { return mbTakesBlocks; }
@@ -60,6 +66,8 @@ private:
     std::string moName;
     std::string moFormat;
     Progress moProgress;
+    krv::threading::IExecutor* mpoExecutor;
+    bool mbChecked;
     bool mbNew; // nothing had the name before
     std::unique_ptr<krv::datasources::IDataset> mpoDataset;
     krv::datasources::IRasterDataset* mpoRaster = nullptr;

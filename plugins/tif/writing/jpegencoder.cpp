@@ -193,6 +193,14 @@ JpegEncoder::JpegEncoder(Page& oPage, std::optional<int> oLevel)
     : moPage(oPage), moForm(oPage.GetForm()), mnQuality(oLevel.value_or(DEFAULT_QUALITY))
 {
     const Bytes oTables = oPage.GetJpegTables();
+    std::uint16_t nAcross = 1;
+    std::uint16_t nDown = 1;
+    if (moForm.mnPhotometric == PHOTOMETRIC_YCBCR &&
+        TIFFGetFieldDefaulted(oPage.GetTiff(), TIFFTAG_YCBCRSUBSAMPLING, &nAcross, &nDown) == 1)
+    {
+        mnAcross = static_cast<std::uint8_t>(nAcross);
+        mnDown = static_cast<std::uint8_t>(nDown);
+    }
     moSharedBytes.assign(oTables.begin(), oTables.end());
     moShared = JpegHeader::Read(moSharedBytes);
     moObstacle = MakePlan({}).moObstacle;
@@ -229,12 +237,10 @@ void JpegEncoder::PlanComponents(JpegPlan& oPlan, const JpegHeader& oLike) const
         const auto nName = bColours ? nAt + 1 : static_cast<unsigned char>(NAMES[nChannels - 1][nAt]);
         oPlan.moComponents.push_back({static_cast<std::uint8_t>(nName), 1, 1, nTable, nTable, nTable});
     }
-    std::uint16_t nAcross = 1;
-    std::uint16_t nDown = 1;
-    if (bColours && TIFFGetFieldDefaulted(moPage.GetTiff(), TIFFTAG_YCBCRSUBSAMPLING, &nAcross, &nDown) == 1)
+    if (bColours)
     {
-        oPlan.moComponents[0].mnAcross = static_cast<std::uint8_t>(nAcross);
-        oPlan.moComponents[0].mnDown = static_cast<std::uint8_t>(nDown);
+        oPlan.moComponents[0].mnAcross = mnAcross;
+        oPlan.moComponents[0].mnDown = mnDown;
     }
 }
 

@@ -46,6 +46,8 @@ private:
     Page& moPage;
     const PageForm& moForm;
     int mnQuality;
+    std::uint8_t mnAcross = 1; // the sampling of colours that the page asks for
+    std::uint8_t mnDown = 1;
     std::vector<unsigned char> moSharedBytes;
     JpegHeader moShared;
     std::string moObstacle;

@@ -19,7 +19,8 @@ namespace krv::plugins::tif
 {
 
 // Turns pixels as they are handed in into the stored bytes of a strip or tile. What a tile has beyond the image repeats
-// the last column and row. The frequent codecs run here, the rare ones in libtiff. One thread at a time.
+// the last column and row. The frequent codecs run here, the rare ones in libtiff. One thread at a time;
+// encoders of one page may run side by side.
 class StrileEncoder
 {
 public:
@@ -27,6 +28,8 @@ public:
     StrileEncoder(Page& oPage, PixelUse eUse, std::optional<int> oLevel);
     ~StrileEncoder();
 
+    // What is in the way of writing pixels of the page; empty when nothing is.
+    std::string FindObstacle() const;
     // Throws DataException for a page whose pixels cannot be written.
     void CheckWritable(const Place& oPlace = Place::Current()) const;
 
@@ -53,7 +56,6 @@ private:
         std::size_t mnPitch;
     };
 
-    std::string FindObstacle() const;
     Rows Narrow(const Rows& oRows, std::uint32_t nWidth, std::uint32_t nRows);
     void Pack(const unsigned char* pRow, unsigned char* pNext, std::size_t nSamples) const;
     Rows Pad(const Rows& oRows, std::uint32_t nWidth, std::uint32_t nRows, std::uint32_t nStoredRows);

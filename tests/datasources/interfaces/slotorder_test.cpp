@@ -1,4 +1,5 @@
 #include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/iblockencoding.h"
 #include "datasources/interfaces/ichannelfilter.h"
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
@@ -121,6 +122,8 @@ std::vector<Table> Tables()
         {"IEncodedBlocks",
          {Slot(&IEncodedBlocks::GetEncodedForm), Slot(&IEncodedBlocks::ReadEncoded),
           Slot(&IEncodedBlocks::SetEncodedForm), Slot(&IEncodedBlocks::StoreEncoded)}},
+        {"IBlockEncoder", {Slot(&IBlockEncoder::Encode)}},
+        {"IBlockEncoding", {Slot(&IBlockEncoding::MakeBlockEncoder)}},
         {"IHistoryIO",
          {Slot(&IHistoryIO::ReadHistory), Slot(&IHistoryIO::AppendHistory), Slot(&IHistoryIO::ClearHistory)}},
         {"IMathModelDataset",

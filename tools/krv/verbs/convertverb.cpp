@@ -2,6 +2,7 @@
 #include "toolkit/core/lettercase.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/progress.h"
+#include "tools/krv/threads.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -59,7 +60,7 @@ int RunConvert(Options& oOptions)
     oRequest.promote = oOptions.type == "promoted";
     if (!oOptions.type.empty() && !oRequest.promote)
         oRequest.type = ParseType(oOptions.type);
-    Convert(oRequest, oOptions.form, ShowProgress());
+    Convert(oRequest, oOptions.form, ShowProgress(), GetExecutor());
     return 0;
 }
 
@@ -83,6 +84,8 @@ void AddConvertVerb(CLI::App& oApp, Selection& oSelection)
     poVerb->add_option("--options", poOptions->form.options,
                        "\"KEY=VALUE ...\" of the format, such as \"COMPRESS=ZSTD BLOCKXSIZE=512\"; \"LAYOUT=COG\" of "
                        "TIF also builds levels");
+    poVerb->add_flag("--check", poOptions->form.check,
+                     "Decode what is copied as it is stored: a damaged file is refused instead of copied");
     poVerb->callback(
         [&oSelection, poOptions]
         {

@@ -3,12 +3,14 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/overviews/overviewbuilder.h"
+#include "datasources/reader/irasterreader.h"
 #include "datasources/writer/basicwriter.h"
 #include "operations/source/sourcefile.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/progress.h"
+#include "tools/krv/threads.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -117,17 +119,11 @@ int RunOverviews(const std::string& file, Options& oOptions)
 {
     auto oLevels = ParseLevels(oOptions.levels);
     SetChanged(oOptions.changed, oOptions.building);
-    std::vector<ChannelGroup> oGroups;
-    std::string method;
-    unsigned int nWidth = 0, nHeight = 0;
-    {
-        const SourceFile oFile(file);
-        nWidth = oFile.GetRaster().GetWidth();
-        nHeight = oFile.GetRaster().GetHeight();
-        oGroups = oFile.GroupByType(oFile.CheckChannels({}));
-        CheckChanged(file, oOptions.building, nWidth, nHeight);
-        method = ChooseMethod(file, oOptions.resampling, IsIndexed(oFile.GetDataset()));
-    }
+    const SourceFile oFile(file);
+    const unsigned int nWidth = oFile.GetRaster().GetWidth(), nHeight = oFile.GetRaster().GetHeight();
+    const std::vector<ChannelGroup> oGroups = oFile.GroupByType(oFile.CheckChannels({}));
+    CheckChanged(file, oOptions.building, nWidth, nHeight);
+    const std::string method = ChooseMethod(file, oOptions.resampling, IsIndexed(oFile.GetDataset()));
     if (oLevels.empty())
         oLevels = krv::datasources::GetDefaultLevels(nWidth, nHeight);
     if (oLevels.empty())
@@ -139,6 +135,11 @@ int RunOverviews(const std::string& file, Options& oOptions)
     for (const ChannelGroup& oGroup : oGroups)
     {
         BasicWriter oWriter(dynamic_cast<krv::datasources::IRasterDataset*>(poDataset.get()), oGroup.channels);
+        oOptions.building.mpoExecutor = GetExecutor();
+        oOptions.building.moMakeReader = [&oFile, &oGroup]
+        {
+            return oFile.ReadAgain(oGroup.channels, true);
+        };
         Build(oWriter, oLevels, method, oOptions.building);
     }
     poDataset->Synchronize();
