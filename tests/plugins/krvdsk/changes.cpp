@@ -10,7 +10,8 @@
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/crsfactory.h"
 
-#include <cstring>
+#include <algorithm>
+#include <filesystem>
 
 namespace krv::test
 {
@@ -117,6 +118,12 @@ std::string TellAll(KrvdskDataset& oDataset)
 }
 
 } // namespace
+
+void WriteAnew(const std::string& fileName, const std::string& bytes)
+{
+    std::filesystem::remove(fileName);
+    krv::conformance::WriteFile(fileName, bytes);
+}
 
 NativePointer OpenNative(const std::string& fileName, AccessMode eMode)
 {

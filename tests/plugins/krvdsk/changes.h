@@ -15,6 +15,9 @@ using NativePointer = std::unique_ptr<krv::plugins::krvdsk::KrvdskDataset>;
 using IOPointer = std::unique_ptr<krv::datasources::IRasterIO>;
 using Types = std::vector<krv::gobs::DataType>;
 
+// Some systems bring a file that is written over to the disk at once, which takes the time of many tests.
+void WriteAnew(const std::string& fileName, const std::string& bytes);
+
 NativePointer OpenNative(const std::string& fileName, AccessMode eMode = eReadOnly);
 NativePointer CreateNative(const std::string& fileName, const std::string& options, unsigned int nWidth,
                            unsigned int nHeight, const Types& oTypes);

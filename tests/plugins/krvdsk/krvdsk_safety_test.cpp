@@ -24,7 +24,6 @@ namespace
 using namespace krv::test;
 using krv::conformance::ReadFile;
 using krv::conformance::TempFolder;
-using krv::conformance::WriteFile;
 using namespace krv::gobs;
 
 const Types MIXED = {eDT_8U, eDT_8U, eDT_8U, eDT_32R, eDT_C16S};
@@ -92,7 +91,7 @@ TEST(KrvdskSafety, APowerFailureLeavesAWholeState)
             {
                 const auto oNext = std::find_if(oCommits.begin(), oCommits.end(),
                                                 [nCalls](const Commit& oCommit) { return oCommit.mnEnd > nCalls; });
-                WriteFile(crashed, Crash(before, oCalls, nCalls, oRandom));
+                WriteAnew(crashed, Crash(before, oCalls, nCalls, oRandom));
                 const NativePointer poLeft = OpenNative(crashed);
                 const std::string told = Tell(*poLeft);
                 const bool bUnderWay = oNext != oCommits.end() && oNext->mnBegin <= nCalls && told == oNext->moTold;
