@@ -226,8 +226,7 @@ TEST(Jp2Room, ChangesAreSeenAtOnceAndMakeTheFileAnewAsAWhole)
         auto* pExpected = reinterpret_cast<std::uint16_t*>(oExpected.data());
         for (unsigned int nAt = 0; nAt < nWidth * nHeight; ++nAt)
             pExpected[((nY + nAt / nWidth) * oImage.mnWidth + nX + nAt % nWidth) * 2 + nChannel] = oPart[nAt];
-        if (nRound % 7 == 0)
-            EXPECT_EQ(ReadAll(*poDataset, oImage), oExpected);
+        EXPECT_TRUE(nRound % 7 != 0 || ReadAll(*poDataset, oImage) == oExpected) << nRound;
         if (nRound % 13 == 0)
         {
             poDataset->Synchronize();
@@ -364,7 +363,7 @@ TEST(Jp2Room, HostileHeadersAreRefusedBeforeMemoryIsTaken)
         {8, 4, 0x7FFFFFFF, "tiles; there can be"},
         {16, 4, 300, "out of range"},
         {24, 4, 0, "out of range"},
-        {24, 8, 0x0000000100000001, "there can be 65535"},
+        {24, 8, 0x0000000100000001, "is missing"},
         {32, 4, 400, "out of range"},
         {40, 2, 0, "components"},
         {40, 2, 65535, "components"},
