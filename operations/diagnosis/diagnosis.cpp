@@ -6,6 +6,8 @@
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/ifileformat.h"
+#include "datasources/interfaces/ilinkeddataset.h"
+#include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
@@ -18,6 +20,7 @@
 #include "operations/job/exceptions.h"
 #include "operations/source/sourcefile.h"
 #include "toolkit/core/core.h"
+#include "toolkit/mathmodel/imathmodel.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/icrs.h"
 #include "toolkit/xml/xmltree.h"
@@ -276,6 +279,13 @@ void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Findin
                 for (const unsigned int nBitmap : poBitmaps->GetBitmapList())
                     ReadEnds(*std::unique_ptr<IRasterIO>(poBitmaps->GetBitmapIO({nBitmap})));
             });
+    if (auto* const poModels = dynamic_cast<IMathModelDataset*>(&oDataset); poModels != nullptr)
+        Try("the sensor models",
+            [&]
+            {
+                for (const unsigned int nModel : poModels->GetMathModelList())
+                    std::unique_ptr<krv::mathmodel::IMathModel>(poModels->GetMathModel(nModel));
+            });
     if (const auto* const poTables = dynamic_cast<IPCTDataset*>(&oDataset); poTables != nullptr)
         Try("the colour tables",
             [&]
@@ -283,6 +293,22 @@ void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Findin
                 for (const unsigned int nTable : poTables->GetPCTList())
                     std::unique_ptr<krv::gobs::PCT>(poTables->GetPCT(nTable));
             });
+}
+
+// Where the pixels lie when they are not in the file. False when they cannot be had.
+bool CheckLinks(const IDataset& oDataset, const std::string& subject, std::vector<Finding>& oFindings)
+{
+    const auto* const poLinked = dynamic_cast<const ILinkedDataset*>(&oDataset);
+    bool bThere = true;
+    for (const std::string& file : poLinked != nullptr ? poLinked->GetLinkedFiles() : std::vector<std::string>())
+    {
+        const std::string why = WhyUnreadable(file);
+        bThere = bThere && why.empty();
+        oFindings.push_back({why.empty(), subject,
+                             fmt::format("its pixels lie in {}{}{}", file, why.empty() ? "" : ": ", why),
+                             why.empty() ? "" : "put that file back to where the link leads, or link anew (krv link)"});
+    }
+    return bThere;
 }
 
 // What is warned of while the file is read is a finding too.
@@ -297,7 +323,7 @@ void CheckOpening(const std::string& file, const LoadedPlugin& oPlugin, std::vec
         const std::unique_ptr<IDataset> poDataset(oPlugin.builder->Open(file, eReadOnly));
         if (poDataset == nullptr)
             oFindings.push_back({false, subject, "recognises the file and opens nothing", "report the plug-in"});
-        else
+        else if (CheckLinks(*poDataset, subject, oFindings))
         {
             oFindings.push_back({true, subject, "recognises the file; " + DescribeOpened(*poDataset), {}});
             TryParts(*poDataset, subject, oFindings);

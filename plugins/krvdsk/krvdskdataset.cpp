@@ -140,9 +140,8 @@ std::shared_ptr<support::IBlockSource> KrvdskDataset::MakeLevelSource(unsigned i
         ForgetOldPixels();
     };
     const Catalogue& oCatalogue = GetCatalogue();
-    const auto poOwn = nLevel == 1
-                           ? MakeSource(oCatalogue.moPlanes, 1, oCatalogue.moSize, BeforeWrite)
-                           : MakeSource(oCatalogue.moPlanes, nLevel, oCatalogue.moLevels.at(nLevel), {});
+    const auto poOwn = nLevel == 1 ? MakeSource(oCatalogue.moPlanes, 1, oCatalogue.moSize, BeforeWrite)
+                                   : MakeSource(oCatalogue.moPlanes, nLevel, oCatalogue.moLevels.at(nLevel), {});
     if (oCatalogue.moLinked.empty())
         return poOwn;
     return std::make_shared<LinkedSource>(mpoLink, oCatalogue.moLinked, nLevel, poOwn);
