@@ -129,7 +129,7 @@ std::vector<double> ProcessorMedians(const std::vector<std::function<void()>>& o
 void ReadTiles(const Scene& oScene, unsigned int nMargin, unsigned int nFirst = 0, unsigned int nStep = 1)
 {
     BasicReader oReader(oScene.moName);
-    oReader.SetMargins(nMargin, nMargin, krv::datasources::eReplicate);
+    oReader.SetMargins(nMargin, nMargin, eReplicate);
     for (unsigned int nTile = nFirst; nTile < oReader.GetTileCount(); nTile += nStep)
     {
         const std::unique_ptr<krv::gobs::Raster> poRaster(oReader.GetRaster(nTile));

@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <climits>
+#include <numeric>
 #include <utility>
 
 namespace krv::plugins::jp2
@@ -464,8 +465,13 @@ std::vector<Codestream::Piece> Codestream::CutOut(const TileRange& oTiles, std::
                 oPieces.push_back({{}, oPart.mnOffset + SOT_BYTES, oPart.mnBytes - SOT_BYTES});
                 oNumbers.push_back(oPart.mnNumber);
             }
-            const double nEstimate = EstimateMemory(nTile, oParts);
-            if (nEstimate > static_cast<double>(nMemory))
+            // Large tiles that are what they say have data.
+            const auto AddBytes = [](std::uint64_t nSum, const TilePart& oPart)
+            {
+                return nSum + oPart.mnBytes;
+            };
+            const std::uint64_t nData = std::accumulate(oParts.begin(), oParts.end(), std::uint64_t{0}, AddBytes);
+            if (EstimateMemory(nTile, oParts) > static_cast<double>(nMemory + 2 * nData))
                 Fail("tile " + std::to_string(nTile) + " is cut into so many code-blocks or packets that decoding it " +
                      "takes more than " + std::to_string(nMemory >> 20) + " MiB");
         }

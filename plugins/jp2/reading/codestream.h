@@ -113,8 +113,8 @@ public:
         std::uint64_t mnOffset = 0; // where moBytes is empty
         std::uint64_t mnBytes = 0;
     };
-    // nMemory: what the decoder may take for the structure of the tiles beside their data. Throws FileFormatException
-    // for tiles that are missing, truncated or damaged, or take more.
+    // nMemory: what the decoder may take for the structure of a tile, beside twice the bytes of its data. Throws
+    // FileFormatException for tiles that are missing, truncated or damaged, or take more.
     std::vector<Piece> CutOut(const TileRange& oTiles, std::uint64_t nMemory);
 
 private:

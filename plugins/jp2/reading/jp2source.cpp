@@ -75,6 +75,14 @@ Jp2Source::Jp2Source(std::shared_ptr<Codestream> poStream, unsigned int nReduce,
 
 Jp2Source::~Jp2Source() = default;
 
+// With the size of the blocks, which a bound changes.
+support::BlockOrigin Jp2Source::GetOrigin() const
+{
+    return {mpoStream->GetFile(), "JP2 " + std::to_string(moResolution.GetReduce()) + " " +
+                                      std::to_string(moLayout.GetBlockWidth()) + "x" +
+                                      std::to_string(moLayout.GetBlockHeight())};
+}
+
 support::ImageLayout Jp2Source::MakeLayout() const
 {
     return {moResolution.GetWidth(), moResolution.GetHeight(), moResolution.GetBlockWidth(),

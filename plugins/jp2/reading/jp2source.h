@@ -25,6 +25,7 @@ public:
 
     const support::ImageLayout& GetLayout() const override { return moLayout; }
     std::string GetName() const override { return mpoStream->GetFile()->GetName(); }
+    support::BlockOrigin GetOrigin() const override;
     void ReadBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
                    std::size_t nPitch) override;
 

@@ -11,8 +11,8 @@ namespace
 {
 
 constexpr std::uint64_t SAMPLE_BYTES = 4;
-// Decoding a part of a tile takes the samples twice.
-constexpr std::uint64_t AREA_SAMPLE_BYTES = 8;
+// Decoding a part of a tile takes the samples three times.
+constexpr std::uint64_t AREA_SAMPLE_BYTES = 12;
 // Smaller tiles are read several at a time.
 constexpr std::uint32_t SMALL_BLOCK = 64;
 constexpr std::uint32_t USUAL_BLOCK = 256;
