@@ -486,6 +486,7 @@ bool BuildEachType(const MultiTypeWriter& oWriter, const std::vector<unsigned in
                    OverviewOptions oOptions)
 {
     const auto oTypes = FindTypes(oWriter);
+    oOptions.moMakeReader = nullptr; // it reads all channels, as one type
     const auto oProgress = std::move(oOptions.moProgress);
     std::uint64_t nTypesDone = 0;
     oOptions.moProgress = [&](std::uint64_t nDone, std::uint64_t nTotal)
