@@ -81,6 +81,22 @@ MetadataMap ShownTags(const AuxiliaryData& oRecord, unsigned int nChannel)
     return oTags;
 }
 
+// The book of levels of a pair: a level is as both channels say, where they agree, and valid without a method when both
+// have it so.
+void JoinBooks(AuxiliaryData oFirst, unsigned int nFirst, AuxiliaryData oSecond, unsigned int nSecond,
+               MetadataMap& oTags)
+{
+    const MetadataMap oOther = oSecond.GetChanOverviewMetadata(nSecond);
+    for (const auto& [key, state] : oFirst.GetChanOverviewMetadata(nFirst))
+    {
+        const auto oFound = oOther.find(key);
+        if (oFound == oOther.end())
+            continue;
+        const bool bValid = state.starts_with("valid") && oFound->second.starts_with("valid");
+        oTags[key] = state == oFound->second ? state : bValid ? "valid" : "invalid";
+    }
+}
+
 // The other way: tags in the place of those that were shown.
 void ReplaceTags(AuxiliaryData& oRecord, unsigned int nChannel, const MetadataMap& oTags)
 {
@@ -421,6 +437,7 @@ AuxiliaryData MetaComplexDataset::JoinRecords(const AuxiliaryData& oFirst, const
             oTags[WithSuffix(key)] = value;
         if (const auto oNoData = mpoState->FindNoData(oFirst, oSecond, nPair))
             oTags[NO_DATA_KEY] = oNoData->moComplex.GetText();
+        JoinBooks(oFirst, oPair.mnFirst, oSecond, oPair.mnSecond, oTags);
         const std::string description = oFirst.GetChannelDescription(oPair.mnFirst);
         const std::string other = oSecond.GetChannelDescription(oPair.mnSecond);
         if (!other.empty() && other != description)
@@ -470,7 +487,8 @@ void MetaComplexDataset::WriteAuxiliaryData(const AuxiliaryData& oData)
         const ComplexPair& oPair = mpoState->moPairs[nPair];
         const auto nChannel = static_cast<unsigned int>(nPair) + 1;
         MetadataMap oFirstMap, oSecondMap;
-        for (const auto& [key, value] : oData.GetChanMetadata(nChannel))
+        const AuxiliaryData oTold = oData.GetCleanedMeta(); // the book of levels is their manager's
+        for (const auto& [key, value] : oTold.GetChanMetadata(nChannel))
         {
             if (key == NO_DATA_KEY || key == DESCRIPTION_KEY)
                 continue;

@@ -274,6 +274,7 @@ TEST(MetaComplexDataset, LevelsAreThoseThatBothHave)
     const std::unique_ptr<IOverviewManager> oLevels(oDataset.GetOverviewManager());
     EXPECT_EQ(oLevels->GetLevels(), Channels{2});
     EXPECT_TRUE(oLevels->IsValid(1, 2) && !oLevels->IsValid(1, 4) && !oLevels->IsValid(2, 2));
+    EXPECT_EQ(oDataset.ReadAuxiliaryData().GetChanMetadata(1), (MetadataMap{{"_Overview_2", "valid AVERAGE"}}));
     EXPECT_NE(Error([&] { oLevels->GetOverviewIO(4, {1}); }), "");
     // The mean of a complex channel is that of its parts.
     const auto ReadLevel = [](IDataset& oSource)
