@@ -15,6 +15,7 @@
 
 #include <algorithm>
 #include <limits>
+#include <map>
 #include <optional>
 #include <string_view>
 #include <utility>
@@ -55,6 +56,11 @@ DataType FindComplexType(const DataType& oType, eComplexForm eForm)
     default:
         return eDT_C64R;
     }
+}
+
+std::size_t ValueBytes(const DataType& oType)
+{
+    return static_cast<std::size_t>(oType.GetValueBits() / 8);
 }
 
 bool EndsInSuffix(const std::string& key)
@@ -133,10 +139,12 @@ struct MetaComplexDataset::State
 
     std::optional<detail::PairNoData> FindNoData(const AuxiliaryData& oFirst, const AuxiliaryData& oSecond,
                                                  std::size_t nPair) const;
-    // The I/O of the sources for pairs, of the image or of levels, made by oOpen(second, channels).
+    // The I/O of pairs of channels of one type over those of the sources, made by oOpen(second, channels).
     template <typename Open>
-    std::pair<std::unique_ptr<IRasterIO>, std::unique_ptr<IRasterIO>>
-    OpenSources(const std::vector<unsigned int>& oChannels, const Open& oOpen) const;
+    std::unique_ptr<IRasterIO> OpenPairs(const std::vector<unsigned int>& oChannels, const Open& oOpen) const;
+    // The same for any pairs of one complex type: those of one type each are read together.
+    template <typename Part, typename Open>
+    std::vector<Part> OpenParts(const std::vector<unsigned int>& oChannels, const Open& oOpen) const;
     detail::PairForm MakeForm(const std::vector<unsigned int>& oChannels) const;
 };
 
@@ -160,8 +168,8 @@ std::optional<detail::PairNoData> MetaComplexDataset::State::FindNoData(const Au
 }
 
 template <typename Open>
-std::pair<std::unique_ptr<IRasterIO>, std::unique_ptr<IRasterIO>>
-MetaComplexDataset::State::OpenSources(const std::vector<unsigned int>& oChannels, const Open& oOpen) const
+std::unique_ptr<IRasterIO> MetaComplexDataset::State::OpenPairs(const std::vector<unsigned int>& oChannels,
+                                                                const Open& oOpen) const
 {
     std::vector<unsigned int> oFirst, oSecond;
     for (const unsigned int nChannel : oChannels)
@@ -173,7 +181,24 @@ MetaComplexDataset::State::OpenSources(const std::vector<unsigned int>& oChannel
     std::unique_ptr<IRasterIO> poSecond(mpoSecond != nullptr ? oOpen(true, oSecond) : nullptr);
     if (poFirst == nullptr || (mpoSecond != nullptr && poSecond == nullptr))
         throw krv::DataException("A source of complex pairs gave no raster I/O");
-    return {std::move(poFirst), std::move(poSecond)};
+    return std::make_unique<detail::PairIO>(std::move(poFirst), std::move(poSecond), MakeForm(oChannels));
+}
+
+template <typename Part, typename Open>
+std::vector<Part> MetaComplexDataset::State::OpenParts(const std::vector<unsigned int>& oChannels,
+                                                       const Open& oOpen) const
+{
+    std::map<DataType, std::pair<std::vector<unsigned int>, std::vector<std::size_t>>> oByType;
+    for (std::size_t n = 0; n < oChannels.size(); ++n)
+    {
+        auto& [oNumbers, oPositions] = oByType[moSourceTypes[oChannels[n] - 1]];
+        oNumbers.push_back(oChannels[n]);
+        oPositions.push_back(n);
+    }
+    std::vector<Part> oParts;
+    for (const auto& [oType, oMembers] : oByType)
+        oParts.push_back({OpenPairs(oMembers.first, oOpen), oMembers.second});
+    return oParts;
 }
 
 detail::PairForm MetaComplexDataset::State::MakeForm(const std::vector<unsigned int>& oChannels) const
@@ -220,10 +245,12 @@ public:
         CheckLevel(nLevel);
         static_cast<void>(
             detail::CheckChannelList(oChannels, moState.moTypes, moDataset.moDescription, Place::Current()));
-        auto [poFirst, poSecond] =
-            moState.OpenSources(oChannels, [&](bool bSecond, const std::vector<unsigned int>& oList)
-                                { return (bSecond ? mpoSecond : mpoFirst)->GetOverviewIO(nLevel, oList); });
-        return new detail::PairLevelIO(nLevel, std::move(poFirst), std::move(poSecond), moState.MakeForm(oChannels));
+        const auto Open = [&](bool bSecond, const std::vector<unsigned int>& oList)
+        {
+            return (bSecond ? mpoSecond : mpoFirst)->GetOverviewIO(nLevel, oList);
+        };
+        return new detail::PairLevelIO(nLevel, moState.OpenParts<detail::PairLevelIO::Part>(oChannels, Open),
+                                       ValueBytes(moState.moTypes[oChannels.front() - 1]));
     }
     void CreateLevel(unsigned int nLevel) override
     {
@@ -547,15 +574,14 @@ IRasterIO* MetaComplexDataset::GetRasterIO(const std::vector<unsigned int>& oCha
     const Place oPlace = Place::Current();
     CheckOpen(oPlace);
     static_cast<void>(detail::CheckChannelList(oChannels, mpoState->moTypes, moDescription, oPlace));
-    for (const unsigned int nChannel : oChannels)
-        if (mpoState->moSourceTypes[nChannel - 1] != mpoState->moSourceTypes[oChannels.front() - 1])
-            Refuse("channels " + std::to_string(oChannels.front()) + " and " + std::to_string(nChannel) +
-                       " are pairs of different types",
-                   oPlace);
-    auto [poFirst, poSecond] = mpoState->OpenSources(
-        oChannels, [&](bool bSecond, const std::vector<unsigned int>& oList)
-        { return (bSecond ? mpoState->mpoSecondRasters : mpoState->mpoFirstRasters)->GetRasterIO(oList); });
-    return new detail::PairIO<IRasterIO>(std::move(poFirst), std::move(poSecond), mpoState->MakeForm(oChannels));
+    const auto Open = [&](bool bSecond, const std::vector<unsigned int>& oList)
+    {
+        return (bSecond ? mpoState->mpoSecondRasters : mpoState->mpoFirstRasters)->GetRasterIO(oList);
+    };
+    auto oParts = mpoState->OpenParts<detail::StackedIO<IRasterIO>::Part>(oChannels, Open);
+    if (oParts.size() == 1)
+        return oParts.front().mpoIO.release();
+    return new detail::StackedIO<IRasterIO>(std::move(oParts), ValueBytes(mpoState->moTypes[oChannels.front() - 1]));
 }
 
 unsigned int MetaComplexDataset::GetWidth() const
