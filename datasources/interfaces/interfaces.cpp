@@ -20,6 +20,7 @@
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
+#include "datasources/interfaces/isidecardataset.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/interfaces/iverifieddataset.h"
 
@@ -47,6 +48,7 @@ IPCTDataset::~IPCTDataset() = default;
 IPagedDataset::~IPagedDataset() = default;
 IRasterDataset::~IRasterDataset() = default;
 IRasterIO::~IRasterIO() = default;
+ISidecarDataset::~ISidecarDataset() = default;
 IStorageDataset::~IStorageDataset() = default;
 IVerifiedDataset::~IVerifiedDataset() = default;
 

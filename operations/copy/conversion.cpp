@@ -198,7 +198,9 @@ BitmapNumbers CopyBitmaps(const CopyPlan& oPlan, const Target& oTarget)
             continue;
         }
         for (const unsigned int nBitmap : oList)
-            oNumbers[nBitmap] = CopyBitmap(*poFrom, nBitmap, *poTo, oPlan.GetWindow(), oTarget.GetProgress());
+            oTarget.Try(
+                Of(oPlan, s, fmt::format("bitmap {}", nBitmap)), [&]
+                { oNumbers[nBitmap] = CopyBitmap(*poFrom, nBitmap, *poTo, oPlan.GetWindow(), oTarget.GetProgress()); });
     }
     return oNumbers;
 }

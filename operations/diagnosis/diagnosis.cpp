@@ -10,6 +10,7 @@
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
+#include "datasources/interfaces/isidecardataset.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/basicreader.h"
@@ -275,6 +276,20 @@ void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Findin
             {
                 for (const unsigned int nBitmap : poBitmaps->GetBitmapList())
                     ReadEnds(*std::unique_ptr<IRasterIO>(poBitmaps->GetBitmapIO({nBitmap})));
+            });
+    // What is wrong with one that is not used is a warning already.
+    if (auto* const poSidecars = dynamic_cast<ISidecarDataset*>(&oDataset); poSidecars != nullptr)
+        Try("the files beside it",
+            [&]
+            {
+                for (const Sidecar& oSidecar : poSidecars->ListSidecars())
+                    if (oSidecar.mbUsed || oSidecar.moTrouble.empty())
+                        oFindings.push_back({true,
+                                             "file " + oSidecar.moFile,
+                                             fmt::format("says the {}{}{}", oSidecar.moSays,
+                                                         oSidecar.mbUsed ? "" : ", which the file itself says",
+                                                         oSidecar.moTrouble.empty() ? "" : "; " + oSidecar.moTrouble),
+                                             {}});
             });
     if (const auto* const poTables = dynamic_cast<IPCTDataset*>(&oDataset); poTables != nullptr)
         Try("the colour tables",

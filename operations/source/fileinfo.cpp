@@ -10,6 +10,7 @@
 #include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/isidecardataset.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/metadata/displaydefaults.h"
 #include "datasources/metadata/referencetag.h"
@@ -192,6 +193,8 @@ FileInfo GatherInfo(const SourceFile& oFile)
                              GetDefaultGrey(oMetadata)};
     if (auto* const poStorage = dynamic_cast<IStorageDataset*>(&oDataset))
         oInfo.unusedBytes = poStorage->GetUnusedBytes();
+    if (auto* const poSidecars = dynamic_cast<ISidecarDataset*>(&oDataset))
+        oInfo.sidecars = Attempt(oFile, "the files beside it", [&] { return poSidecars->ListSidecars(); });
     if (const auto* const poPages = dynamic_cast<IPagedDataset*>(&oDataset))
         oInfo.furtherImages = poPages->CountFurtherImages();
     return oInfo;
