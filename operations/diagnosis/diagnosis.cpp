@@ -267,6 +267,10 @@ void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Findin
             [&]
             {
                 const std::unique_ptr<IOverviewManager> poLevels(poRaster->GetOverviewManager());
+                // Levels beside the file: what keeps them from being used is a warning.
+                if (poLevels == nullptr || poLevels->GetLevels().empty())
+                    std::unique_ptr<IDataset>(
+                        DatasetManager::GetInstance()->OpenFormat("GDBALL", oDataset.GetName(), eReadOnly));
                 for (const unsigned int nLevel : poLevels ? poLevels->GetLevels() : std::vector<unsigned int>())
                     ReadEnds(*std::unique_ptr<IRasterIO>(poLevels->GetOverviewIO(nLevel, {1})));
             });
