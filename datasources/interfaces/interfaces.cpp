@@ -8,6 +8,7 @@
 #include "datasources/interfaces/iephemerisdataset.h"
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/interfaces/ifileiobuilder.h"
+#include "datasources/interfaces/iformatoptions.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
 #include "datasources/interfaces/ilinkeddataset.h"
@@ -36,6 +37,7 @@ IEphemerisDataset::~IEphemerisDataset() = default;
 IEphemerisRecords::~IEphemerisRecords() = default;
 IFileFormat::~IFileFormat() = default;
 IFileIOBuilder::~IFileIOBuilder() = default;
+IFormatOptions::~IFormatOptions() = default;
 IGeocodedDataset::~IGeocodedDataset() = default;
 IHistoryIO::~IHistoryIO() = default;
 ILinkedDataset::~ILinkedDataset() = default;

@@ -129,6 +129,11 @@ SharedImage::SharedImage(const std::string& fileName, std::unique_ptr<IDataset> 
 
 SharedImage::~SharedImage()
 {
+    Leave();
+}
+
+void SharedImage::Leave()
+{
     if (mpToken == nullptr)
         return;
     fpRemove(mpToken);
@@ -137,6 +142,7 @@ SharedImage::~SharedImage()
         GetRegister().moImages.erase(mpToken);
     }
     std::fclose(mpToken);
+    mpToken = nullptr;
 }
 
 std::shared_ptr<SharedImage> SharedImage::Find(const std::string& fileName, AccessMode eMode)
@@ -168,8 +174,13 @@ void SharedImage::Synchronize()
     mpoLevels->Synchronize();
 }
 
-void SharedImage::Close()
+void SharedImage::RemoveDataset(bool bClose)
 {
+    if (--mnDatasets != 0)
+        return;
+    Leave();
+    if (!bClose)
+        return;
     mpoImage->Close();
     mpoLevels->Close();
 }
@@ -177,9 +188,14 @@ void SharedImage::Close()
 GenericDataset::GenericDataset(std::shared_ptr<SharedImage> poImage)
     : moName(poImage->GetName()), mpoImage(std::move(poImage))
 {
+    mpoImage->AddDataset();
 }
 
-GenericDataset::~GenericDataset() = default;
+GenericDataset::~GenericDataset()
+{
+    if (mpoImage)
+        mpoImage->RemoveDataset(false);
+}
 
 SharedImage& GenericDataset::Get(const Place& oPlace) const
 {
@@ -205,7 +221,11 @@ IFileFormat* GenericDataset::GetFileFormat() const
 FileAccessState GenericDataset::Delete()
 {
     const auto poImage = std::move(mpoImage);
-    return poImage ? poImage->GetImage().Delete() : eNotFound;
+    if (!poImage)
+        return eNotFound;
+    const FileAccessState eState = poImage->GetImage().Delete();
+    poImage->RemoveDataset(false);
+    return eState;
 }
 
 bool GenericDataset::Exists() const
@@ -246,8 +266,8 @@ void GenericDataset::Synchronize()
 void GenericDataset::Close()
 {
     const auto poImage = std::move(mpoImage);
-    if (poImage && poImage.use_count() == 1)
-        poImage->Close();
+    if (poImage)
+        poImage->RemoveDataset(true);
 }
 
 IRasterIO* GenericDataset::GetRasterIO(const std::vector<unsigned int>& oChannels)

@@ -44,10 +44,17 @@ public:
     }
 
     void Synchronize();
-    void Close();
+
+    // The datasets over it are counted, whatever else keeps it. The last one closes the files when it is closed itself,
+    // and takes them out of the table in any case.
+    void AddDataset() { ++mnDatasets; }
+    void RemoveDataset(bool bClose);
 
 private:
+    void Leave();
+
     std::string moName;
+    unsigned int mnDatasets = 0;
     std::unique_ptr<krv::datasources::IDataset> mpoImage;
     krv::datasources::IRasterDataset* mpoRaster;
     std::unique_ptr<LevelsBeside> mpoLevels;
