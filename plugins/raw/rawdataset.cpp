@@ -273,7 +273,7 @@ void RawDataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
 
 support::Sidecars::Needs RawDataset::GetNeeds() const
 {
-    return {!moImage.moGeocoding, ReadOwnCRS() == nullptr, true};
+    return {true, !moImage.moGeocoding, ReadOwnCRS() == nullptr, true};
 }
 
 std::vector<unsigned int> RawDataset::GetPCTList() const

@@ -69,7 +69,8 @@ void TifDataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
 support::Sidecars::Needs TifDataset::GetNeeds() const
 {
     krv::ogc::cs::GeocodingInfo oInfo;
-    return {!ReadGeocoding(GetPage().GetTiff(), oInfo), tif::ReadCRS(GetPage().GetTiff()) == nullptr, !HasOwnMask()};
+    return {true, !ReadGeocoding(GetPage().GetTiff(), oInfo), tif::ReadCRS(GetPage().GetTiff()) == nullptr,
+            !HasOwnMask()};
 }
 
 const krv::ogc::cs::GeocodingInfo& TifDataset::GetGeocoding() const

@@ -210,7 +210,7 @@ TEST(RealRawFiles, ImagesHaveTheirSidecars)
         if (!file.ends_with(".ovr"))
             continue;
         const std::string image = oFacts.GetPath().substr(0, oFacts.GetPath().size() - 4);
-        auto oSums = std::vector{oFacts.List("band_crc32")};
+        std::vector<std::vector<std::string>> oSums{oFacts.List("band_crc32")};
         for (const std::string& page : oFacts.List("overviews", ' '))
             oSums.push_back(Split(page.substr(page.find(':') + 1), ';'));
         for (std::size_t n = 0; n < oSums.size(); ++n)

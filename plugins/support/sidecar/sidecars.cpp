@@ -345,14 +345,14 @@ std::vector<krv::datasources::Sidecar> Sidecars::List(const Needs& oNeeds)
     ReadGeocoding();
     ReadCRS();
     HasMask();
-    Add(moAuxXmlName, "metadata", true, false);
+    Add(moAuxXmlName, "metadata", oNeeds.mbTags, false);
     if (!moAuxXmlName.empty() && oAuxXml.GetStamp() && oStamp && *oAuxXml.GetStamp() != *oStamp)
         oList.back().moTrouble = "the file changed after it was written";
     Add(FindWorldFile(), "geocoding", oNeeds.mbGeocoding && !oAuxXml.GetGeocoding(), false);
     Add(FindSidecar(moFileName, PROJECTION), "reference system", oNeeds.mbCRS && oAuxXml.GetCRS().empty(), false);
     Add(*moMaskName, "mask", oNeeds.mbMask && mpoMask != nullptr, true);
     for (const char* const pEnding : {"_RPC.TXT", ".rpb"})
-        Add(FindSidecar(moFileName, pEnding), "sensor model", true, false);
+        Add(FindSidecar(moFileName, pEnding), "sensor model", oNeeds.mbTags, false);
     Add(FindAppended(moFileName, ".ovr"), "levels", true, true);
     return oList;
 }

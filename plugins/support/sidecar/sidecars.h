@@ -58,6 +58,7 @@ public:
     // the file's own says nothing of the geocoding, of the system and of validity.
     struct Needs
     {
+        bool mbTags = false; // the format adds tags and sensor models
         bool mbGeocoding = false;
         bool mbCRS = false;
         bool mbMask = false;
