@@ -13,6 +13,7 @@ namespace
 {
 
 constexpr unsigned int MASK = 1;
+constexpr unsigned int TEXT_MODEL = 1; // of support/sidecar
 constexpr char NEW_ZONE[] = "Bitmap 1";
 
 } // namespace
@@ -95,22 +96,35 @@ void RawDataset::SetBitmapMetadata(unsigned int nBitmap, const krv::datasources:
 
 std::vector<unsigned int> RawDataset::GetMathModelList() const
 {
-    return support::FindModelSidecars(GetFileName());
+    const bool bNew = mpoWriter && !mpoWriter->IsNamed();
+    std::vector<unsigned int> oList = bNew ? std::vector<unsigned int>() : support::FindModelSidecars(GetFileName());
+    if (moModel && std::find(oList.begin(), oList.end(), TEXT_MODEL) == oList.end())
+        oList.insert(oList.begin(), TEXT_MODEL);
+    return oList;
 }
 
 krv::mathmodel::IMathModel* RawDataset::GetMathModel(unsigned int nSegment)
 {
+    if (moModel && nSegment == TEXT_MODEL)
+        return new krv::mathmodel::RpcModel(*moModel);
     return new krv::mathmodel::RpcModel(support::ReadModelSidecar(GetFileName(), nSegment));
 }
 
-unsigned int RawDataset::CreateMathModel(const krv::mathmodel::IMathModel&)
+unsigned int RawDataset::CreateMathModel(const krv::mathmodel::IMathModel& oModel)
 {
-    Refuse("sensor models cannot be written");
+    const Place oPlace = Place::Current();
+    CheckWriting("sensor models cannot be written", oPlace);
+    const auto* const poPolynomials = dynamic_cast<const krv::mathmodel::RpcModel*>(&oModel);
+    if (poPolynomials == nullptr)
+        Refuse("a sensor model of the kind " + oModel.GetName() + " cannot be written", oPlace);
+    mpoWriter->BeginChange();
+    moModel = poPolynomials->GetCoefficients();
+    return TEXT_MODEL;
 }
 
 void RawDataset::DeleteMathModel(unsigned int)
 {
-    Refuse("sensor models cannot be deleted");
+    Refuse("sensor models cannot be deleted: remove the text beside the file");
 }
 
 } // namespace krv::plugins::raw

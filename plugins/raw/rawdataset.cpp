@@ -2,6 +2,7 @@
 
 #include "gobs/pct/pct.h"
 #include "plugins/raw/envirecord.h"
+#include "plugins/support/sidecar/modelsidecars.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/crsfactory.h"
@@ -141,6 +142,9 @@ void RawDataset::Synchronize()
     if (!IsWritten() || !HasImage())
         return;
     GetSidecars().StoreMask();
+    if (moModel)
+        support::WriteModelSidecar(GetFileName(), *moModel);
+    moModel.reset();
     GetSidecars().StoreAuxXml();
 }
 

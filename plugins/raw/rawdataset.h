@@ -9,6 +9,7 @@
 #include "plugins/support/dataset.h"
 #include "plugins/support/image/plainsource.h"
 #include "plugins/support/writing/options.h"
+#include "toolkit/mathmodel/rpccoefficients.h"
 
 #include <memory>
 #include <string>
@@ -81,7 +82,7 @@ public:
     void SetBitmapMetadata(unsigned int nBitmap, const krv::datasources::MetadataMap& oMetadata) override;
     krv::datasources::IOverviewManager* GetBitmapOverviewManager() override { return nullptr; }
 
-    // Those of the texts beside the file.
+    // Those of the texts beside the file; a rational polynomial model is written to the first one.
     bool HasMathModel() const override { return !GetMathModelList().empty(); }
     std::vector<unsigned int> GetMathModelList() const override;
     krv::mathmodel::IMathModel* GetMathModel(unsigned int nSegment) override;
@@ -107,7 +108,8 @@ private:
     std::shared_ptr<RawWriter> mpoWriter; // null when the file is only read
     std::shared_ptr<support::PlainSource> mpoSource;
     mutable std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding;
-    bool mbZone = false; // the new mask has not been made one of validity
+    std::optional<krv::mathmodel::RpcCoefficients> moModel; // to be written
+    bool mbZone = false;                                    // the new mask has not been made one of validity
 };
 
 } // namespace krv::plugins::raw
