@@ -9,6 +9,7 @@
 #include "datasources/interfaces/iephemerisdataset.h"
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/interfaces/ifileiobuilder.h"
+#include "datasources/interfaces/iformatoptions.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
 #include "datasources/interfaces/ilinkeddataset.h"
@@ -21,6 +22,7 @@
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
+#include "datasources/interfaces/isidecardataset.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/interfaces/iverifieddataset.h"
 
@@ -38,6 +40,7 @@ IEphemerisDataset::~IEphemerisDataset() = default;
 IEphemerisRecords::~IEphemerisRecords() = default;
 IFileFormat::~IFileFormat() = default;
 IFileIOBuilder::~IFileIOBuilder() = default;
+IFormatOptions::~IFormatOptions() = default;
 IGeocodedDataset::~IGeocodedDataset() = default;
 IHistoryIO::~IHistoryIO() = default;
 ILinkedDataset::~ILinkedDataset() = default;
@@ -50,6 +53,7 @@ IPCTDataset::~IPCTDataset() = default;
 IPagedDataset::~IPagedDataset() = default;
 IRasterDataset::~IRasterDataset() = default;
 IRasterIO::~IRasterIO() = default;
+ISidecarDataset::~ISidecarDataset() = default;
 IStorageDataset::~IStorageDataset() = default;
 IVerifiedDataset::~IVerifiedDataset() = default;
 

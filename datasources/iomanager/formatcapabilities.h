@@ -42,6 +42,7 @@ inline constexpr char CAPABILITY_CONTROL_POINT_CREATE[] = "/Format/Capabilities/
 inline constexpr char CAPABILITY_CONTROL_POINT_DELETE[] = "/Format/Capabilities/ControlPoint/CanDelete";
 
 // Asked by krv convert: the option NBITS=n of a new file stores samples of n bits, less than their type has.
+inline constexpr char CAPABILITY_UPDATE[] = "/Format/Capabilities/Dataset/SupportsUpdate";
 inline constexpr char CAPABILITY_NARROW_SAMPLES[] = "/Format/Capabilities/Dataset/SupportsNarrowSamples";
 
 } // namespace krv::datasources

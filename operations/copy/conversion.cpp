@@ -209,7 +209,8 @@ BitmapNumbers CopyBitmaps(const CopyPlan& oPlan, const Target& oTarget)
             continue;
         }
         for (const unsigned int nBitmap : oList)
-            oNumbers[nBitmap] = CopyBitmap(oPlan.GetSource(s), nBitmap, oTarget, oPlan.GetWindow());
+            oTarget.Try(Of(oPlan, s, fmt::format("bitmap {}", nBitmap)), [&]
+                        { oNumbers[nBitmap] = CopyBitmap(oPlan.GetSource(s), nBitmap, oTarget, oPlan.GetWindow()); });
     }
     return oNumbers;
 }

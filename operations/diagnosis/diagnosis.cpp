@@ -12,6 +12,7 @@
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
+#include "datasources/interfaces/isidecardataset.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/basicreader.h"
@@ -269,6 +270,10 @@ void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Findin
             [&]
             {
                 const std::unique_ptr<IOverviewManager> poLevels(poRaster->GetOverviewManager());
+                // Levels beside the file: what keeps them from being used is a warning.
+                if (poLevels == nullptr || poLevels->GetLevels().empty())
+                    std::unique_ptr<IDataset>(
+                        DatasetManager::GetInstance()->OpenFormat("GDBALL", oDataset.GetName(), eReadOnly));
                 for (const unsigned int nLevel : poLevels ? poLevels->GetLevels() : std::vector<unsigned int>())
                     ReadEnds(*std::unique_ptr<IRasterIO>(poLevels->GetOverviewIO(nLevel, {1})));
             });
@@ -285,6 +290,20 @@ void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Findin
             {
                 for (const unsigned int nModel : poModels->GetMathModelList())
                     std::unique_ptr<krv::mathmodel::IMathModel>(poModels->GetMathModel(nModel));
+            });
+    // What is wrong with one that is not used is a warning already.
+    if (auto* const poSidecars = dynamic_cast<ISidecarDataset*>(&oDataset); poSidecars != nullptr)
+        Try("the files beside it",
+            [&]
+            {
+                for (const Sidecar& oSidecar : poSidecars->ListSidecars())
+                    if (oSidecar.mbUsed || oSidecar.moTrouble.empty())
+                        oFindings.push_back({true,
+                                             "file " + oSidecar.moFile,
+                                             fmt::format("says the {}{}{}", oSidecar.moSays,
+                                                         oSidecar.mbUsed ? "" : ", which the file itself says",
+                                                         oSidecar.moTrouble.empty() ? "" : "; " + oSidecar.moTrouble),
+                                             {}});
             });
     if (const auto* const poTables = dynamic_cast<IPCTDataset*>(&oDataset); poTables != nullptr)
         Try("the colour tables",

@@ -7,9 +7,11 @@
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
+#include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/isidecardataset.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/metadata/displaydefaults.h"
 #include "datasources/metadata/referencetag.h"
@@ -192,6 +194,13 @@ FileInfo GatherInfo(const SourceFile& oFile)
                              GetDefaultGrey(oMetadata)};
     if (auto* const poStorage = dynamic_cast<IStorageDataset*>(&oDataset))
         oInfo.unusedBytes = poStorage->GetUnusedBytes();
+    if (auto* const poSidecars = dynamic_cast<ISidecarDataset*>(&oDataset))
+        oInfo.sidecars = Attempt(oFile, "the files beside it", [&] { return poSidecars->ListSidecars(); });
+    // Levels of the file itself come first.
+    const std::unique_ptr<IOverviewManager> poOwn(oFile.GetRaster().GetOverviewManager());
+    for (Sidecar& oSidecar : oInfo.sidecars)
+        if (oSidecar.moSays == "levels")
+            oSidecar.mbUsed = !oInfo.overviews.empty() && (poOwn == nullptr || poOwn->GetLevels().empty());
     if (const auto* const poPages = dynamic_cast<IPagedDataset*>(&oDataset))
         oInfo.furtherImages = poPages->CountFurtherImages();
     return oInfo;

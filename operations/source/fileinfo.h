@@ -1,5 +1,6 @@
 #pragma once
 
+#include "datasources/interfaces/isidecardataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/raster/datatype.h"
 #include "operations/api.h"
@@ -93,6 +94,7 @@ struct FileInfo
     std::vector<ColourTableFacts> colourTables;
     std::array<unsigned int, 4> displayDefaults{}; // red, green, blue, grey; 0: none
     std::optional<std::uint64_t> unusedBytes;
+    std::vector<krv::datasources::Sidecar> sidecars; // in the order in which they are looked for
     std::optional<unsigned int> furtherImages; // nothing where the format has no such files
 };
 

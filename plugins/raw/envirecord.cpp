@@ -434,6 +434,21 @@ bool WriteGeocoding(const GeocodingInfo& oGeocoding, const ICRS* poCRS, HeaderTe
     return true;
 }
 
+void RemoveGeocoding(HeaderText& oHeader)
+{
+    oHeader.Remove(MAP_INFO);
+}
+
+void RemoveCRS(HeaderText& oHeader)
+{
+    oHeader.Remove(CRS_TEXT);
+    if (auto oInfo = ReadMapInfo(oHeader))
+    {
+        std::tie(oInfo->moProjection, oInfo->moRest) = DescribeSystem(nullptr);
+        SetMapInfo(*oInfo, oHeader);
+    }
+}
+
 std::unique_ptr<ICRS> ReadCRS(const HeaderText& oHeader, std::string* pTrouble)
 {
     std::unique_ptr<ICRS> poByText, poByNames;

@@ -29,11 +29,16 @@ std::optional<krv::ogc::cs::GeocodingInfo> ReadGeocoding(const HeaderText& oHead
 bool WriteGeocoding(const krv::ogc::cs::GeocodingInfo& oGeocoding, const krv::ogc::cs::ICRS* poCRS,
                     HeaderText& oHeader);
 
+void RemoveGeocoding(HeaderText& oHeader);
+
 // By "coordinate system string", or else by the names of "map info". Null when there is neither; trouble: why what is
 // there means nothing.
 std::unique_ptr<krv::ogc::cs::ICRS> ReadCRS(const HeaderText& oHeader, std::string* pTrouble = nullptr);
 // False when the header cannot say it.
 bool WriteCRS(const krv::ogc::cs::ICRS& oCRS, HeaderText& oHeader);
+
+// Leaves where the image lies on the map.
+void RemoveCRS(HeaderText& oHeader);
 
 // The colours of classes, value 0 the first.
 std::optional<krv::gobs::PCT> ReadClasses(const HeaderText& oHeader);

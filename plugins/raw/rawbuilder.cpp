@@ -16,6 +16,10 @@ RawBuilder::RawBuilder()
     : Builder("Plain pixels with a text header (ENVI, Esri BIL), elevation tiles (HGT)",
               {"img", "dat", "bsq", "bil", "bip", "bin", "raw", "envi", "flt", "hdr", "hgt"}, "RAW")
 {
+    RawOptions oOptions;
+    support::Options oKeys;
+    oOptions.List(oKeys);
+    DescribeOptions(oKeys.Describe());
 }
 
 RawBuilder::~RawBuilder() = default;

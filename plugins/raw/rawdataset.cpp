@@ -2,6 +2,7 @@
 
 #include "gobs/pct/pct.h"
 #include "plugins/raw/envirecord.h"
+#include "plugins/support/sidecar/modelsidecars.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/crsfactory.h"
@@ -86,7 +87,6 @@ void RawDataset::ShowImage(std::shared_ptr<support::File> poFile)
         std::make_shared<support::PlainSource>(std::move(poFile), oForm.PlacePlanes(), oForm.IsSwapped(),
                                                oForm.MakeLayout(), IsWritten() ? BeforeWrite : std::function<void()>());
     SetImage(mpoSource);
-    moGeocoding = moImage.moGeocoding.value_or(krv::ogc::cs::GeocodingInfo());
 }
 
 void RawDataset::Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes)
@@ -134,8 +134,24 @@ krv::datasources::FileAccessState RawDataset::Delete()
     return eState;
 }
 
+void RawDataset::Synchronize()
+{
+    if (HasImage() && mbZone)
+        Refuse("a zone cannot be kept beside the file: a bitmap without a description, the validity mask, can");
+    Dataset::Synchronize();
+    if (!IsWritten() || !HasImage())
+        return;
+    GetSidecars().StoreMask();
+    if (moModel)
+        support::WriteModelSidecar(GetFileName(), *moModel);
+    moModel.reset();
+    GetSidecars().StoreAuxXml();
+}
+
 void RawDataset::Close()
 {
+    if (mpoWriter && !mpoWriter->IsEnded())
+        Synchronize();
     Dataset::Close();
     mpoSource.reset();
 }
@@ -143,7 +159,7 @@ void RawDataset::Close()
 HeaderText& RawDataset::GetHeader(const char* pWhat, const Place& oPlace) const
 {
     CheckWriting(pWhat, oPlace);
-    if (moImage.moFiles.meKind != RawKind::eEnvi)
+    if (!HasHeader())
         Refuse(std::string(pWhat) + ": a file of this kind has no place for it", oPlace);
     return moImage.moHeader;
 }
@@ -153,59 +169,115 @@ void RawDataset::StoreHeader() const
     mpoWriter->SetHeader(moImage.moHeader.Write());
 }
 
+void RawDataset::StoreBeside(support::AuxXml oAuxXml) const
+{
+    mpoWriter->BeginChange();
+    GetSidecars().SetAuxXml(std::move(oAuxXml));
+}
+
 AuxiliaryData RawDataset::ReadAuxiliaryData()
 {
     GetImage();
-    return moImage.moTags;
+    AuxiliaryData oTags = moImage.moTags;
+    GetSidecars().AddTags(oTags);
+    return oTags;
 }
 
 void RawDataset::WriteAuxiliaryData(const AuxiliaryData& oData)
 {
     const Place oPlace = Place::Current();
-    HeaderText oHeader = GetHeader("metadata cannot be written", oPlace);
+    CheckWriting("metadata cannot be written", oPlace);
     if (oData.GetChannelCount() != GetChanCount())
         Refuse("the metadata are those of " + std::to_string(oData.GetChannelCount()) + " channels, not of " +
                    std::to_string(GetChanCount()),
                oPlace);
-    WriteTags(oData, oHeader);
+    support::AuxXml oAuxXml = GetSidecars().GetAuxXml();
+    if (!HasHeader())
+    {
+        for (const auto& [key, value] : moImage.moTags.GetFileMetadata())
+            if (oData.GetFileMetadataValue(key) != value)
+                Refuse("\"" + key + "\" is said by the file itself, which has no place for another value", oPlace);
+        oAuxXml.SetTags(oData);
+        return StoreBeside(std::move(oAuxXml));
+    }
+    HeaderText oHeader = moImage.moHeader;
+    oAuxXml.SetTags(WriteTags(oData, oHeader));
     moImage.moHeader = std::move(oHeader);
     moImage.moTags = ReadTags(moImage.moHeader, GetChanCount());
     StoreHeader();
+    StoreBeside(std::move(oAuxXml));
 }
 
-krv::ogc::cs::ICRS* RawDataset::ReadCRS() const
+std::unique_ptr<krv::ogc::cs::ICRS> RawDataset::ReadOwnCRS() const
 {
     if (moImage.moFiles.meKind == RawKind::eHeight)
-        return krv::ogc::cs::CreateCRSFromEPSG(4326).release();
+        return krv::ogc::cs::CreateCRSFromEPSG(4326);
     std::string trouble;
     auto poCRS = raw::ReadCRS(moImage.moHeader, &trouble);
     if (!trouble.empty())
         krv::nspio::Warning::Warn(moImage.moFiles.moHeader + ": " + trouble);
-    return poCRS.release();
+    return poCRS;
+}
+
+krv::ogc::cs::ICRS* RawDataset::ReadCRS() const
+{
+    GetImage();
+    auto poCRS = ReadOwnCRS();
+    return (poCRS ? std::move(poCRS) : GetSidecars().ReadCRS()).release();
 }
 
 void RawDataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
 {
     const Place oPlace = Place::Current();
-    HeaderText oHeader = GetHeader("the reference system cannot be written", oPlace);
-    if (!WriteCRS(oCRS, oHeader))
-        Refuse("the header cannot say this reference system", oPlace);
+    CheckWriting("the reference system cannot be written", oPlace);
+    if (moImage.moFiles.meKind == RawKind::eHeight)
+        Refuse("the reference system of elevation tiles is fixed", oPlace);
+    support::AuxXml oAuxXml = GetSidecars().GetAuxXml();
+    HeaderText oHeader = moImage.moHeader;
+    const bool bHeader = HasHeader() && WriteCRS(oCRS, oHeader);
+    if (!bHeader)
+        RemoveCRS(oHeader);
+    oAuxXml.SetCRS(bHeader ? std::string() : oCRS.GetWKT());
     moImage.moHeader = std::move(oHeader);
-    StoreHeader();
+    if (HasHeader())
+        StoreHeader();
+    StoreBeside(std::move(oAuxXml));
+}
+
+const krv::ogc::cs::GeocodingInfo& RawDataset::GetGeocoding() const
+{
+    if (!moGeocoding)
+        moGeocoding = moImage.moGeocoding ? moImage.moGeocoding : GetSidecars().ReadGeocoding();
+    if (!moGeocoding)
+        moGeocoding.emplace();
+    return *moGeocoding;
 }
 
 void RawDataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
 {
     const Place oPlace = Place::Current();
-    HeaderText oHeader = GetHeader("the geocoding cannot be written", oPlace);
+    CheckWriting("the geocoding cannot be written", oPlace);
     if (!oInfo.IsInvertible())
         Refuse("a geocoding without an inverse cannot be written", oPlace);
-    const std::unique_ptr<krv::ogc::cs::ICRS> poCRS(ReadCRS());
-    if (!WriteGeocoding(oInfo, poCRS.get(), oHeader))
-        Refuse("the header cannot say this geocoding", oPlace);
+    if (!HasHeader() && moImage.moGeocoding)
+        Refuse("the geocoding is said by the file itself, which has no place for another one", oPlace);
+    support::AuxXml oAuxXml = GetSidecars().GetAuxXml();
+    HeaderText oHeader = moImage.moHeader;
+    const bool bHeader = HasHeader() && WriteGeocoding(oInfo, ReadOwnCRS().get(), oHeader);
+    if (!bHeader)
+        RemoveGeocoding(oHeader);
+    oAuxXml.SetGeocoding(bHeader ? std::nullopt : std::optional(oInfo));
     moImage.moHeader = std::move(oHeader);
+    moImage.moGeocoding = bHeader ? std::optional(oInfo) : std::nullopt;
     moGeocoding = oInfo;
-    StoreHeader();
+    if (HasHeader())
+        StoreHeader();
+    StoreBeside(std::move(oAuxXml));
+}
+
+support::Sidecars::Needs RawDataset::GetNeeds() const
+{
+    return {true, !moImage.moGeocoding, ReadOwnCRS() == nullptr, true};
 }
 
 std::vector<unsigned int> RawDataset::GetPCTList() const

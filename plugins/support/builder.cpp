@@ -40,4 +40,12 @@ void Builder::RefuseOptions(const std::string& fileName, const std::string& opti
                             oPlace);
 }
 
+void Builder::DescribeOptions(const std::vector<Options::Description>& oOptions)
+{
+    std::vector<krv::datasources::FormatOption> oList;
+    for (const Options::Description& oOption : oOptions)
+        oList.push_back({oOption.moKey, oOption.moTakes});
+    moFormat.SetOptions(std::move(oList));
+}
+
 } // namespace krv::plugins::support

@@ -2,6 +2,8 @@
 
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/interfaces/ifileiobuilder.h"
+#include "datasources/interfaces/iformatoptions.h"
+#include "plugins/support/writing/options.h"
 #include "toolkit/exceptions/place.h"
 
 #include <string>
@@ -11,7 +13,7 @@ namespace krv::plugins::support
 {
 
 // The description of a format, given as plain values.
-class FormatDescription : public krv::datasources::ABSFileFormat
+class FormatDescription : public krv::datasources::ABSFileFormat, public krv::datasources::IFormatOptions
 {
 public:
     FormatDescription(const std::string& description, const std::vector<std::string>& oExtensions,
@@ -19,9 +21,12 @@ public:
     ~FormatDescription() override;
 
     std::string GetDescription() const override { return moDescription; }
+    std::vector<krv::datasources::FormatOption> ListOptions() const override { return moOptions; }
+    void SetOptions(std::vector<krv::datasources::FormatOption> oOptions) { moOptions = std::move(oOptions); }
 
 private:
     std::string moDescription;
+    std::vector<krv::datasources::FormatOption> moOptions;
 };
 
 // A builder that opens files only: Create throws DataException until a format overrides it. A format adds Open and
@@ -36,6 +41,8 @@ public:
     krv::datasources::IDataset* Create(const std::string& fileName, const std::string& options) override;
 
 protected:
+    // What is told of the options of a new file; a format with options says them when it is made.
+    void DescribeOptions(const std::vector<Options::Description>& oOptions);
     // Throws DataException for eUpdate, for formats that only read.
     void CheckReadOnly(const std::string& fileName, AccessMode eMode, const Place& oPlace = Place::Current()) const;
     // Throws DataException for options of a new file, for formats that have none.

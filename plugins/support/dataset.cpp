@@ -109,6 +109,22 @@ const ImageLayout& Dataset::GetLayout(const Place& oPlace) const
     return GetImage(oPlace)->GetLayout();
 }
 
+Sidecars& Dataset::GetSidecars() const
+{
+    const ImageLayout& oLayout = GetLayout();
+    if (!mpoSidecars)
+        mpoSidecars = std::make_unique<Sidecars>(moName, oLayout.GetWidth(), oLayout.GetHeight(),
+                                                 oLayout.GetChannelCount(), mpoWriter && !mpoWriter->IsNamed());
+    return *mpoSidecars;
+}
+
+std::vector<krv::datasources::Sidecar> Dataset::ListSidecars()
+{
+    if (!HasImage())
+        return {};
+    return GetSidecars().List(GetNeeds());
+}
+
 krv::datasources::FileAccessState Dataset::Delete()
 {
     if (mpoWriter)
@@ -162,6 +178,7 @@ void Dataset::Close()
     if (mpoWriter && !mpoWriter->IsEnded())
         mpoWriter->Finish();
     mbOpen = false;
+    mpoSidecars.reset();
     mpoImage.reset();
 }
 

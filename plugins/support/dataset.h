@@ -3,9 +3,11 @@
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/isidecardataset.h"
 #include "plugins/support/image/blockcache.h"
 #include "plugins/support/image/blockimage.h"
 #include "plugins/support/image/iblocksource.h"
+#include "plugins/support/sidecar/sidecars.h"
 #include "plugins/support/writing/filewriter.h"
 
 #include <exception>
@@ -24,7 +26,8 @@ namespace krv::plugins::support
 // synchronised.
 class Dataset : public krv::datasources::IDataset,
                 public krv::datasources::IRasterDataset,
-                public krv::datasources::INewFileDataset
+                public krv::datasources::INewFileDataset,
+                public krv::datasources::ISidecarDataset
 {
 public:
     // poFormat: the builder's, kept as a pointer. Operations that need the image throw DataException until SetImage.
@@ -67,6 +70,9 @@ public:
 
     void KeepExisting() override;
 
+    // Nothing before there is an image.
+    std::vector<krv::datasources::Sidecar> ListSidecars() override;
+
     // For what stands on the dataset.
     const std::string& GetFileName() const { return moName; }
     // Throws the DataException of a change to a file that is only read or has no image yet. pWhat: as for Refuse.
@@ -92,6 +98,10 @@ protected:
     // For further images of the dataset: levels, bitmaps.
     const std::shared_ptr<BlockCache>& GetCache() const { return mpoCache; }
     void CheckOpen(const Place& oPlace = Place::Current()) const;
+    // The files beside the file: a format asks them for what its own does not say. Throws as GetImage.
+    Sidecars& GetSidecars() const;
+    // What that is; nothing unless overridden.
+    virtual Sidecars::Needs GetNeeds() const { return {}; }
     // Throws the DataException of an operation that the format lacks. what: such as "channels cannot be deleted".
     [[noreturn]] void Refuse(const std::string& what, const Place& oPlace = Place::Current()) const;
 
@@ -100,6 +110,7 @@ private:
     krv::datasources::IFileFormat* mpoFormat;
     std::shared_ptr<BlockCache> mpoCache;
     std::shared_ptr<BlockImage> mpoImage;
+    mutable std::unique_ptr<Sidecars> mpoSidecars;
     std::shared_ptr<FileWriter> mpoWriter; // null when the file is only read
     bool mbOpen = true;
     int mnExceptions = std::uncaught_exceptions();

@@ -27,7 +27,16 @@ std::vector<unsigned int> TifDataset::GetBitmapList() const
     for (const PageSummary& oMask : GetPages().moMasks)
         oList.push_back(oMask.mnNumber);
     std::sort(oList.begin(), oList.end());
+    if (!HasOwnMask() && GetSidecars().HasMask())
+        oList.push_back(MASK_BESIDE);
     return oList;
+}
+
+bool TifDataset::HasOwnMask() const
+{
+    return GetLevelBitmap() != 0 ||
+           std::any_of(GetPages().moMasks.begin(), GetPages().moMasks.end(),
+                       [](const PageSummary& oMask) { return oMask.mbMask && !oMask.mbDescribed; });
 }
 
 const PageSummary& TifDataset::GetMask(unsigned int nBitmap, const Place& oPlace) const
@@ -45,8 +54,12 @@ krv::datasources::IRasterIO* TifDataset::GetBitmapIO(const std::vector<unsigned 
 {
     std::vector<std::unique_ptr<krv::datasources::IRasterIO>> oParts;
     for (unsigned int nBitmap : oBitmaps)
-        oParts.push_back(std::make_unique<support::RasterIO>(
-            OpenPage(GetMask(nBitmap, Place::Current()).mnOffset, PixelUse::eBitmap), std::vector<unsigned int>{1}));
+        if (IsBeside(nBitmap) && GetSidecars().HasMask())
+            oParts.emplace_back(GetSidecars().OpenMask(false));
+        else
+            oParts.push_back(std::make_unique<support::RasterIO>(
+                OpenPage(GetMask(nBitmap, Place::Current()).mnOffset, PixelUse::eBitmap),
+                std::vector<unsigned int>{1}));
     if (oParts.size() == 1)
         return oParts.front().release();
     return new support::StackedIO(std::move(oParts), 1, 1);
@@ -84,7 +97,8 @@ unsigned int TifDataset::CreateBitmap()
 {
     const Place oPlace = Place::Current();
     FileEditor& oEditor = GetEditor("bitmaps cannot be added", oPlace);
-    const std::vector<unsigned int> oList = GetBitmapList();
+    std::vector<unsigned int> oList = GetBitmapList();
+    std::erase_if(oList, [this](unsigned int nBitmap) { return IsBeside(nBitmap); });
     if (!oList.empty() && oList.back() == UINT_MAX)
         Refuse("the numbers of bitmaps are used up", oPlace);
     const unsigned int nBitmap = oList.empty() ? 1 : oList.back() + 1;
@@ -94,6 +108,8 @@ unsigned int TifDataset::CreateBitmap()
 
 std::string TifDataset::GetBitmapDescription(unsigned int nBitmap) const
 {
+    if (IsBeside(nBitmap) && GetSidecars().HasMask())
+        return {};
     const PageSummary& oMask = GetMask(nBitmap, Place::Current());
     if (oMask.mbDescribed)
         return ReadPageMetadata(oMask.mnOffset).GetFileMetadataValue("ImageDescription");
@@ -127,6 +143,8 @@ void TifDataset::SetBitmapDescription(unsigned int nBitmap, const std::string& o
 
 krv::datasources::MetadataMap TifDataset::GetBitmapMetadata(unsigned int nBitmap) const
 {
+    if (IsBeside(nBitmap) && GetSidecars().HasMask())
+        return {};
     krv::datasources::MetadataMap oMap =
         ReadPageMetadata(GetMask(nBitmap, Place::Current()).mnOffset).GetFileMetadata();
     for (const char* pKey : MASK_KEYS)

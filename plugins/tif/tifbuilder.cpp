@@ -12,6 +12,7 @@ namespace krv::plugins::tif
 TifBuilder::TifBuilder()
     : Builder("GeoTIFF (TIFF and BigTIFF images)", {"tif", "tiff", "tf8", "btf", "ovr", "msk"}, "TIF")
 {
+    DescribeOptions(CreateOptions::Describe());
 }
 
 TifBuilder::~TifBuilder() = default;

@@ -57,7 +57,7 @@ public:
     // Both make new pages of the image and its levels; I/O objects made before are of no more use.
     void DeleteChannel(unsigned int nChannel) override;
 
-    krv::datasources::AuxiliaryData ReadAuxiliaryData() override { return ReadRecord(); }
+    krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
     // Which levels are valid is not taken from the record: their manager keeps that.
     void WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override;
     void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;
@@ -111,8 +111,14 @@ public:
                       std::size_t nBytes) override;
     krv::datasources::IBlockEncoder* MakeBlockEncoder(unsigned int nLevel) override;
 
+protected:
+    support::Sidecars::Needs GetNeeds() const override;
+
 private:
     class Levels;
+
+    // The number of a mask that lies beside the file, shown where the file has no validity mask of its own.
+    static constexpr unsigned int MASK_BESIDE = 65536;
 
     // The other pages by what they are to the first one.
     struct PageTable
@@ -146,6 +152,8 @@ private:
     void ShowImage(std::shared_ptr<support::IBlockSource> poSource);
     Page& GetPage(const Place& oPlace = Place::Current()) const;
     const PageTable& GetPages() const;
+    bool HasOwnMask() const;
+    bool IsBeside(unsigned int nBitmap) const { return nBitmap == MASK_BESIDE && !HasOwnMask(); }
     const PageSummary& GetMask(unsigned int nBitmap, const Place& oPlace) const;
     void CheckPCT(unsigned int nPCT, const Place& oPlace) const;
     krv::datasources::AuxiliaryData ReadRecord() const;

@@ -25,6 +25,13 @@ krv::datasources::AuxiliaryData TifDataset::ReadRecord() const
     return oRecord;
 }
 
+krv::datasources::AuxiliaryData TifDataset::ReadAuxiliaryData()
+{
+    krv::datasources::AuxiliaryData oRecord = ReadRecord();
+    GetSidecars().AddTags(oRecord);
+    return oRecord;
+}
+
 void TifDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData)
 {
     const Place oPlace = Place::Current();
@@ -42,6 +49,8 @@ krv::ogc::cs::ICRS* TifDataset::ReadCRS() const
     std::string trouble;
     std::unique_ptr<krv::ogc::cs::ICRS> poCRS = tif::ReadCRS(GetPage().GetTiff(), &trouble);
     Complain(trouble);
+    if (poCRS == nullptr)
+        poCRS = GetSidecars().ReadCRS();
     return poCRS.release();
 }
 
@@ -57,12 +66,20 @@ void TifDataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
         });
 }
 
+support::Sidecars::Needs TifDataset::GetNeeds() const
+{
+    krv::ogc::cs::GeocodingInfo oInfo;
+    return {true, !ReadGeocoding(GetPage().GetTiff(), oInfo), tif::ReadCRS(GetPage().GetTiff()) == nullptr,
+            !HasOwnMask()};
+}
+
 const krv::ogc::cs::GeocodingInfo& TifDataset::GetGeocoding() const
 {
     if (!moGeocoding)
     {
         krv::ogc::cs::GeocodingInfo oInfo;
-        ReadGeocoding(GetPage().GetTiff(), oInfo);
+        if (!ReadGeocoding(GetPage().GetTiff(), oInfo))
+            oInfo = GetSidecars().ReadGeocoding().value_or(oInfo);
         moGeocoding = oInfo;
     }
     return *moGeocoding;

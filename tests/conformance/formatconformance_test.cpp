@@ -52,7 +52,7 @@ struct FormatTraits
     std::vector<const char*> moVariants; // options of new files
     bool mbMixedTypes;
     bool mbOverviews;
-    int mnFiles; // of one image
+    int mnFiles = 1; // of one image
     // Files of other programs are read in tests/plugins.
     void MakeFile(const std::string& file, const Image& oImage) const
     {

@@ -90,6 +90,14 @@ Json NumbersToJson(const std::vector<MathModelFacts>& oModels)
     return oList;
 }
 
+Json ToJson(const krv::datasources::Sidecar& oSidecar)
+{
+    return {{"file", oSidecar.moFile},
+            {"says", oSidecar.moSays},
+            {"used", oSidecar.mbUsed},
+            {"trouble", TextOrNull(oSidecar.moTrouble)}};
+}
+
 template <typename Facts>
 Json ListToJson(const std::vector<Facts>& oFacts)
 {
@@ -128,6 +136,7 @@ Json InfoToJson(const FileInfo& oInfo)
               {"gray", NumberOrNull(oDisplay[3])}}},
             {"unusedBytes", OrNull(oInfo.unusedBytes)},
             {"furtherImages", OrNull(oInfo.furtherImages)},
+            {"sidecars", ListToJson(oInfo.sidecars)},
             {"models", ListToJson(oInfo.mathModels)},
             {"linkedFiles", oInfo.linkedFiles}};
 }

@@ -114,6 +114,16 @@ std::string DisplayText(const Json& oDisplay)
     return text.empty() ? "" : Line("display", text);
 }
 
+std::string SidecarText(const Json& oSidecar)
+{
+    const bool bUsed = oSidecar["used"] == true;
+    std::string text =
+        fmt::format("{}: {}{}", Text(oSidecar["file"]), Text(oSidecar["says"]), bUsed ? "" : ", not used");
+    if (!oSidecar["trouble"].is_null())
+        text += ": " + Text(oSidecar["trouble"]);
+    return Line("beside", text);
+}
+
 } // namespace
 
 std::string InfoText(const Json& oInfo)
@@ -140,6 +150,8 @@ std::string InfoText(const Json& oInfo)
     text += DisplayText(oInfo["displayDefaults"]);
     if (!oInfo["unusedBytes"].is_null() && oInfo["unusedBytes"] != 0)
         text += Line("unused", fmt::format("{} bytes of the file", Text(oInfo["unusedBytes"])));
+    for (const Json& oSidecar : oInfo["sidecars"])
+        text += SidecarText(oSidecar);
     if (oInfo["furtherImages"].is_number() && oInfo["furtherImages"] != 0)
         text += Line("further", oInfo["furtherImages"].dump() + " images behind this one, which are not shown");
     text += "  channels\n";

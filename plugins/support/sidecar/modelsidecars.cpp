@@ -2,7 +2,10 @@
 
 #include "plugins/support/sidecar/rpctext.h"
 #include "plugins/support/sidecar/sidecarfile.h"
+#include "plugins/support/writing/newfile.h"
 #include "toolkit/exceptions/exceptions.h"
+
+#include <filesystem>
 
 namespace krv::plugins::support
 {
@@ -41,6 +44,19 @@ krv::mathmodel::RpcCoefficients ReadModelSidecar(const std::string& fileName, un
             return oKind.mpParse(ReadSidecar(sidecar, MAXIMUM_BYTES), sidecar);
     }
     throw DataException(fileName + ": there is no sensor model " + std::to_string(nModel));
+}
+
+void WriteModelSidecar(const std::string& fileName, const krv::mathmodel::RpcCoefficients& oModel)
+{
+    const Kind& oKind = KINDS[0];
+    std::string name = FindSidecar(fileName, oKind.mpEnding);
+    if (name.empty())
+        name = std::filesystem::path(fileName).replace_extension().string() + oKind.mpEnding;
+    const std::string text = WriteRpcText(oModel);
+    NewFile oNew(name, true);
+    oNew.GetFile()->Write(0, text.data(), text.size());
+    oNew.GetFile()->Flush();
+    oNew.TakeName(true);
 }
 
 } // namespace krv::plugins::support

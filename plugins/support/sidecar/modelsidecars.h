@@ -19,4 +19,7 @@ std::vector<unsigned int> FindModelSidecars(const std::string& fileName);
 // number.
 krv::mathmodel::RpcCoefficients ReadModelSidecar(const std::string& fileName, unsigned int nModel);
 
+// Replaces the text of number 1 as a whole, or makes it.
+void WriteModelSidecar(const std::string& fileName, const krv::mathmodel::RpcCoefficients& oModel);
+
 } // namespace krv::plugins::support

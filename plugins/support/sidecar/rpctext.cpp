@@ -215,4 +215,15 @@ RpcCoefficients ParseRpb(const std::string& text, const std::string& fileName)
     return Checked(oModel, oWords);
 }
 
+std::string WriteRpcText(const RpcCoefficients& oModel)
+{
+    std::string text;
+    for (const NumberKeys& oKeys : NUMBERS)
+        text += std::string(oKeys.mpText) + ": " + NumberText(oModel.*oKeys.mpNumber) + "\n";
+    for (const PolynomialKeys& oKeys : POLYNOMIALS)
+        for (std::size_t n = 0; n < std::tuple_size_v<RpcCoefficients::Polynomial>; ++n)
+            text += oKeys.mpText + std::to_string(n + 1) + ": " + NumberText((oModel.*oKeys.mpPolynomial)[n]) + "\n";
+    return text;
+}
+
 } // namespace krv::plugins::support

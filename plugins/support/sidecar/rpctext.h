@@ -15,6 +15,9 @@ namespace krv::plugins::support
 // Lines of "LINE_OFF: 5124.0 pixels", a line for each coefficient: "LINE_NUM_COEFF_1: ...".
 krv::mathmodel::RpcCoefficients ParseRpcText(const std::string& text, const std::string& fileName);
 
+// The same as a text, each number as short as it reads back the same.
+std::string WriteRpcText(const krv::mathmodel::RpcCoefficients& oModel);
+
 // Statements of "lineOffset = 5124;" and "lineNumCoef = (1.0, ...);", in groups or not.
 krv::mathmodel::RpcCoefficients ParseRpb(const std::string& text, const std::string& fileName);
 

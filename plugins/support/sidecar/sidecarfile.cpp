@@ -10,20 +10,37 @@
 namespace krv::plugins::support
 {
 
-std::string FindSidecar(const std::string& fileName, const std::string& ending)
+namespace
 {
-    const std::filesystem::path oFile(fileName);
-    const std::string stem = oFile.stem().string();
-    const std::string names[] = {stem + ending, stem + ToLower(ending), stem + ToUpper(ending), ToLower(stem + ending),
-                                 ToUpper(stem + ending)};
+
+std::string FindBeside(const std::filesystem::path& oFile, const std::string& base, const std::string& ending)
+{
+    const std::string names[] = {base + ending, base + ToLower(ending), base + ToUpper(ending), ToLower(base + ending),
+                                 ToUpper(base + ending)};
+    std::string tried;
     for (const std::string& name : names)
     {
         const std::filesystem::path oSidecar = oFile.parent_path() / name;
         std::error_code oNone;
-        if (std::filesystem::is_regular_file(oSidecar, oNone))
+        if (name != tried && std::filesystem::is_regular_file(oSidecar, oNone))
             return oSidecar.string();
+        tried = name;
     }
     return {};
+}
+
+} // namespace
+
+std::string FindSidecar(const std::string& fileName, const std::string& ending)
+{
+    const std::filesystem::path oFile(fileName);
+    return FindBeside(oFile, oFile.stem().string(), ending);
+}
+
+std::string FindAppended(const std::string& fileName, const std::string& ending)
+{
+    const std::filesystem::path oFile(fileName);
+    return FindBeside(oFile, oFile.filename().string(), ending);
 }
 
 std::string ReadSidecar(const std::string& sidecar, std::size_t nMaximum)

@@ -11,6 +11,9 @@ namespace krv::plugins::support
 // letters and in capitals, then the whole name in small letters and in capitals.
 std::string FindSidecar(const std::string& fileName, const std::string& ending);
 
+// The same with the ending behind the whole name, such as ".msk".
+std::string FindAppended(const std::string& fileName, const std::string& ending);
+
 // All of a sidecar. Throws FileFormatException when it has more than nMaximum bytes, and what opening and reading
 // throw.
 std::string ReadSidecar(const std::string& sidecar, std::size_t nMaximum);

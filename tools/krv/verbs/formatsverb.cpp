@@ -1,5 +1,6 @@
 #include "datasources/formatregistrar/winformatregistrar.h"
 #include "datasources/interfaces/ifileformat.h"
+#include "datasources/interfaces/iformatoptions.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/iomanager/formatcapabilities.h"
 #include "tools/krv/errors.h"
@@ -25,6 +26,7 @@ namespace
 
 constexpr std::pair<const char*, const char*> CAPABILITIES[] = {
     {"create", CAPABILITY_CREATE},
+    {"update", CAPABILITY_UPDATE},
     {"metadata", CAPABILITY_METADATA},
     {"georeferencing", CAPABILITY_GEOREFERENCING},
     {"narrowSamples", CAPABILITY_NARROW_SAMPLES},
@@ -42,6 +44,10 @@ Json FormatToJson(const DatasetManager& oManager, const IFileFormat& oFormat)
                {"capabilities", Json::object()}};
     for (const auto& [pName, pXPath] : CAPABILITIES)
         oJson["capabilities"][pName] = oCapabilities.IsSupported(pXPath);
+    oJson["options"] = Json::array();
+    if (const auto* const poOptions = dynamic_cast<const IFormatOptions*>(&oFormat))
+        for (const FormatOption& oOption : poOptions->ListOptions())
+            oJson["options"].push_back({{"key", oOption.moKey}, {"takes", oOption.moTakes}});
     return oJson;
 }
 
@@ -71,17 +77,30 @@ std::string TableText(const std::vector<Row>& oRows)
     return text;
 }
 
+// What a new file of the format may be told, key by key.
+std::string OptionsText(const Json& oFormat)
+{
+    std::string text;
+    for (const Json& oOption : oFormat["options"])
+        text += fmt::format("  {:<14}{}\n", OneLine(oOption["key"].get<std::string>()),
+                            OneLine(oOption["takes"].get<std::string>()));
+    return text.empty() ? text
+                        : fmt::format("\nOptions of a new {}\n{}", OneLine(oFormat["name"].get<std::string>()), text);
+}
+
 int RunFormats(bool bJson)
 {
     const DatasetManager& oManager = *DatasetManager::GetInstance();
     Json oJson{{"home", GetFormatHome()}, {"formats", Json::array()}};
+    std::string options;
     std::vector<Row> oRows{{"NAME", "DESCRIPTION", "EXTENSIONS", "CAN"}};
     for (const IFileFormat* const poFormat : oManager.GetFormatList())
     {
         oJson["formats"].push_back(FormatToJson(oManager, *poFormat));
         oRows.push_back(FormatRow(oJson["formats"].back()));
+        options += OptionsText(oJson["formats"].back());
     }
-    Print(bJson ? ToText(oJson) : TableText(oRows));
+    Print(bJson ? ToText(oJson) : TableText(oRows) + options);
     return 0;
 }
 
@@ -89,7 +108,8 @@ int RunFormats(bool bJson)
 
 void AddFormatsVerb(CLI::App& oApp, Selection& oSelection)
 {
-    auto* const poVerb = oApp.add_subcommand("formats", "Lists the formats: name, extensions, what each can do");
+    auto* const poVerb =
+        oApp.add_subcommand("formats", "Lists the formats: name, extensions, what each can do, options of new files");
     const auto poJson = std::make_shared<bool>(false);
     poVerb->add_flag("--json", *poJson, "As JSON");
     poVerb->callback(

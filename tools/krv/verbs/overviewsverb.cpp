@@ -1,4 +1,5 @@
 #include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/iomanager/datasetmanager.h"
@@ -17,6 +18,7 @@
 #include <fmt/format.h>
 
 #include <algorithm>
+#include <exception>
 #include <memory>
 
 namespace krv::tool
@@ -87,11 +89,35 @@ void CheckChanged(const std::string& file, const OverviewOptions& oOptions, unsi
                                      oPart.mnWidth, oPart.mnHeight, oPart.mnX, oPart.mnY, nWidth, nHeight));
 }
 
+bool HasPlaceForLevels(IDataset& oDataset)
+{
+    auto* const poRaster = dynamic_cast<krv::datasources::IRasterDataset*>(&oDataset);
+    return poRaster != nullptr &&
+           std::unique_ptr<krv::datasources::IOverviewManager>(poRaster->GetOverviewManager()) != nullptr;
+}
+
+// A file that cannot hold levels, or cannot be changed, gets them in a file beside it.
 std::unique_ptr<IDataset> OpenForUpdate(const std::string& file)
 {
-    std::unique_ptr<IDataset> poDataset(krv::datasources::DatasetManager::GetInstance()->Open(file, eUpdate));
+    auto* const poManager = krv::datasources::DatasetManager::GetInstance();
+    std::unique_ptr<IDataset> poDataset;
+    std::exception_ptr poRefusal;
+    try
+    {
+        poDataset.reset(poManager->Open(file, eUpdate));
+        if (poDataset != nullptr && HasPlaceForLevels(*poDataset))
+            return poDataset;
+    }
+    catch (const krv::DataException&)
+    {
+        poRefusal = std::current_exception();
+    }
+    poDataset.reset();
+    poDataset.reset(poManager->OpenFormat("GDBALL", file, eUpdate));
+    if (poDataset == nullptr && poRefusal)
+        std::rethrow_exception(poRefusal);
     if (poDataset == nullptr)
-        throw krv::DataException(file + ": its format cannot update files");
+        throw krv::DataException(file + ": levels can be made neither in the file nor beside it");
     return poDataset;
 }
 

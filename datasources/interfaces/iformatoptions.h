@@ -1,0 +1,28 @@
+#pragma once
+
+#include "datasources/api.h"
+
+#include <string>
+#include <vector>
+
+namespace krv::datasources
+{
+
+// What users may say of a new file of a format: a key, and what it takes, in words: "YES, NO", "a number from 1 to 9".
+struct FormatOption
+{
+    std::string moKey;
+    std::string moTakes;
+};
+
+// A facet of format descriptions (IFileFormat), found by dynamic_cast. The order of the virtual operations is public and
+// fixed.
+class KRV_DATASOURCES_API IFormatOptions
+{
+public:
+    virtual ~IFormatOptions();
+
+    virtual std::vector<FormatOption> ListOptions() const = 0;
+};
+
+} // namespace krv::datasources
