@@ -15,8 +15,8 @@ struct FormatOption
     std::string moTakes;
 };
 
-// A facet of format descriptions (IFileFormat), found by dynamic_cast. The order of the virtual operations is public and
-// fixed.
+// A facet of format descriptions (IFileFormat), found by dynamic_cast. The order of the virtual operations is public
+// and fixed.
 class KRV_DATASOURCES_API IFormatOptions
 {
 public:

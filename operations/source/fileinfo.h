@@ -95,7 +95,7 @@ struct FileInfo
     std::array<unsigned int, 4> displayDefaults{}; // red, green, blue, grey; 0: none
     std::optional<std::uint64_t> unusedBytes;
     std::vector<krv::datasources::Sidecar> sidecars; // in the order in which they are looked for
-    std::optional<unsigned int> furtherImages; // nothing where the format has no such files
+    std::optional<unsigned int> furtherImages;       // nothing where the format has no such files
 };
 
 // A part that cannot be read leaves the others to be shown, and a warning says so.

@@ -192,7 +192,7 @@ TEST(RealRawFiles, AgreeWithTheTableOfFacts)
 TEST(RealRawFiles, ImagesHaveTheirSidecars)
 {
     unsigned int nCompared = 0;
-    for (const Facts& oFacts : krv::test::ReadFacts("FACTS2.tsv"))
+    for (const Facts& oFacts : krv::test::GetFacts("FACTS2.tsv"))
     {
         if (oFacts["kind"] != "tiff" || !oFacts.Has("geotransform"))
             continue;
@@ -204,7 +204,7 @@ TEST(RealRawFiles, ImagesHaveTheirSidecars)
     }
     EXPECT_TRUE(nCompared == 0 || nCompared == 6) << nCompared;
     // The pages of levels, by the table of TIFF files.
-    for (const Facts& oFacts : krv::test::ReadFacts("FACTS2_TIFF.tsv"))
+    for (const Facts& oFacts : krv::test::GetFacts("FACTS2_TIFF.tsv"))
     {
         const std::string& file = oFacts["file"];
         if (!file.ends_with(".ovr"))
