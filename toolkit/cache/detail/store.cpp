@@ -29,6 +29,13 @@ bool MayWait(TileLayer eLayer)
            (eLayer == TileLayer::eBlocks || CountMaking(TileLayer::eDerived) == 0);
 }
 
+// Memory passes on to tiles that are somewhat smaller, as those at an image's edge: new memory for each of them would
+// leave holes behind that nothing fits into.
+bool Serves(std::size_t nThere, std::size_t nWanted)
+{
+    return nThere >= nWanted && nThere / 2 <= nWanted;
+}
+
 void Widen(TileFrame& oFrame, const TileFrame& oOther)
 {
     oFrame.mnLeft = std::max(oFrame.mnLeft, oOther.mnLeft);
@@ -310,7 +317,8 @@ void Store::Settle()
 }
 
 // The shards tell their oldest without a lock: what they said may have changed, and then the next one is asked. Frames
-// stay until nothing else is left or they take half of the room. poTaker gets the memory if it is of the size it needs.
+// stay until nothing else is left or they take half of the room. poTaker gets the memory if it is of a size that
+// serves.
 bool Store::EvictOne(Entry* poTaker)
 {
     std::bitset<2 * SHARDS> oTried;
@@ -357,7 +365,7 @@ bool Store::EvictFrom(Shard& oShard, std::size_t nList, Entry* poTaker)
             poGone.reset(poEntry);
         oFreed = std::move(poEntry->moMemory);
     }
-    if (poTaker != nullptr && oFreed.GetSize() == poTaker->GetBytes())
+    if (poTaker != nullptr && Serves(oFreed.GetSize(), poTaker->GetBytes()))
         poTaker->moMemory = std::move(oFreed);
     return true;
 }
