@@ -181,6 +181,9 @@ std::unique_ptr<IRasterIO> MetaComplexDataset::State::OpenPairs(const std::vecto
     std::unique_ptr<IRasterIO> poSecond(mpoSecond != nullptr ? oOpen(true, oSecond) : nullptr);
     if (poFirst == nullptr || (mpoSecond != nullptr && poSecond == nullptr))
         throw krv::DataException("A source of complex pairs gave no raster I/O");
+    if (poSecond != nullptr &&
+        (poFirst->GetFileWidth() != poSecond->GetFileWidth() || poFirst->GetFileHeight() != poSecond->GetFileHeight()))
+        throw krv::DataException("The sources of complex pairs give raster I/O of different sizes");
     return std::make_unique<detail::PairIO>(std::move(poFirst), std::move(poSecond), MakeForm(oChannels));
 }
 
@@ -705,6 +708,9 @@ IRasterIO* MetaComplexDataset::GetBitmapIO(const std::vector<unsigned int>& oBit
             oBitmap.mpoFirst.reset(RequireBitmaps(mpoState->mpoFirst.get(), moDescription).GetBitmapIO({nBitmap}));
         if (nBitmap != nOwn && nBitmap == FindValidityMask(*poFirst))
             oBitmap.mpoSecond.reset(oSecond.GetBitmapIO({nSecondMask}));
+        for (const IRasterIO* const poIO : {oBitmap.mpoFirst.get(), oBitmap.mpoSecond.get()})
+            if (poIO != nullptr && (poIO->GetFileWidth() != GetWidth() || poIO->GetFileHeight() != GetHeight()))
+                Refuse("bitmap " + std::to_string(nBitmap) + " is not of the image's size", oPlace);
     }
     return new detail::JoinedBitmapIO(std::move(oJoined));
 }

@@ -109,9 +109,6 @@ MultiTypeWriter::MultiTypeWriter(IRasterDataset* poDataset, const std::vector<Ch
             throw krv::DataException("A writer of " + std::to_string(poWriter->GetChansCount()) + " channels has " +
                                          std::to_string(oWriters[n].moPlaces.size()) + " places",
                                      oPlace);
-        if (poWriter->GetWidth() != oWriters.front().mpoWriter->GetWidth() ||
-            poWriter->GetHeight() != oWriters.front().mpoWriter->GetHeight())
-            throw krv::DataException("The writers differ in size", oPlace);
         for (const unsigned int nPlace : oWriters[n].moPlaces)
         {
             if (nPlace >= oPlaced.size() || oPlaced[nPlace])
@@ -138,6 +135,10 @@ detail::OpenedChannels MultiTypeWriter::Join(std::vector<detail::WriterGroup> oG
                                              const std::vector<unsigned int>& oChannels, const Place& oPlace)
 {
     std::vector<krv::gobs::DataType> oTypes(oChannels.size());
+    for (const detail::WriterGroup& oGroup : oGroups)
+        if (oGroup.mpoWriter->GetWidth() != oGroups.front().mpoWriter->GetWidth() ||
+            oGroup.mpoWriter->GetHeight() != oGroups.front().mpoWriter->GetHeight())
+            throw krv::DataException("The writers differ in size", oPlace);
     for (const detail::WriterGroup& oGroup : oGroups)
         for (const unsigned int nPosition : oGroup.moPositions)
             oTypes[nPosition] = oGroup.mpoWriter->GetDataType();

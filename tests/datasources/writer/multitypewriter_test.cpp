@@ -6,6 +6,7 @@
 #include "datasources/overviews/overviewbuilder.h"
 #include "datasources/reader/multitypereader.h"
 #include "datasources/writer/defaultwriter.h"
+#include "datasources/writer/memorywriter.h"
 #include "datasources/writer/multitypeoverviewwriteraccessor.h"
 #include "gobs/raster/buffertype.h"
 #include "tests/datasources/reader/readertest.h"
@@ -285,6 +286,12 @@ TEST_F(MultiTypeWriterTest, RefusalsSayWhatIsWrong)
                   }),
               "data: A writer is NULL");
     EXPECT_EQ(Error([&] { MultiTypeWriter(Rasters(), Writers{}, {}); }), "data: Channel list can not be empty");
+    MemoryWriter* const poSmall = new MemoryWriter({5, 5, 1, gobs::eDT_8U});
+    EXPECT_EQ(Error(
+                  [&] {
+                      MultiTypeWriter(Rasters(), Writers{{One(1), {0}}, {poSmall, {1}}}, {1, 2});
+                  }),
+              "data: The writers differ in size");
     MultiTypeWriter oWriter(Rasters(), {1, 2});
     const Raster oOther({4, 4, 2, gobs::eDT_8U}, {0, 0}), oOutside({4, 4, 2, gobs::eDT_16S}, {298, 0});
     EXPECT_NE(Error([&] { oWriter.WriteRaster(&oOther); }), "");
