@@ -8,6 +8,8 @@
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/writer/basicwriter.h"
+#include "datasources/writer/defaultwriter.h"
+#include "datasources/writer/irasterwriter.h"
 #include "gobs/pct/pct.h"
 #include "operations/copy/detail/copylevels.h"
 #include "operations/copy/detail/copymodels.h"
@@ -160,8 +162,9 @@ void CopyChannels(const CopyPlan& oPlan, const Target& oTarget)
             {
                 return oFile.Read(oChannelList);
             };
-        BasicWriter oWriter(&oTarget.GetRaster(), oWritten);
-        CopyPixels(oSources, {oWriter}, oPlan.GetWindow(), oCounter, oTarget.GetExecutor());
+        // Types are never promoted on the way: some promotions lose values.
+        const std::unique_ptr<IRasterWriter> poWriter(CreateDefaultWriter(&oTarget.Get(), oWritten));
+        CopyPixels(oSources, {*poWriter}, oPlan.GetWindow(), oCounter, oTarget.GetExecutor());
     }
 }
 
