@@ -19,6 +19,7 @@
 #include <fmt/format.h>
 
 #include <algorithm>
+#include <map>
 #include <memory>
 #include <numeric>
 
@@ -216,20 +217,30 @@ private:
         return poBlocks->SetEncodedForm(nLevel, oForm);
     }
 
+    // The channels of each type by themselves.
     void CopyValues(unsigned int nLevel) const
     {
-        BasicOverviewWriterAccessor oAccessor(&moTarget.GetRaster(), moChannels);
+        std::map<krv::gobs::DataType, std::vector<unsigned int>> oByType;
+        for (std::size_t n = 0; n < moChannels.size(); ++n)
+            oByType[moPlan.GetTypes()[n]].push_back(moChannels[n]);
+        for (const auto& oEntry : oByType)
+            CopyValues(nLevel, oEntry.second);
+    }
+
+    void CopyValues(unsigned int nLevel, const std::vector<unsigned int>& oChannels) const
+    {
+        BasicOverviewWriterAccessor oAccessor(&moTarget.GetRaster(), oChannels);
         const std::unique_ptr<IRasterWriter> poWriter(oAccessor.CreateRasterWriter(nLevel));
         const PixelWindow oAll{0, 0, poWriter->GetWidth(), poWriter->GetHeight()};
-        std::vector<unsigned int> oPositions(moChannels.size());
+        std::vector<unsigned int> oPositions(oChannels.size());
         for (unsigned int nAt = 0; nAt < oPositions.size(); ++nAt)
             oPositions[nAt] = nAt;
         ProgressCounter oCounter(
             moTarget.GetProgress(), "overviews",
             krv::gobs::BufferBytes(oAll.width, oAll.height, poWriter->GetChansCount(), poWriter->GetDataType()));
-        const auto Open = [this, nLevel](const SourceFile& oFile)
+        const auto Open = [oChannels, nLevel](const SourceFile& oFile)
         {
-            return oFile.Read(moChannels, nLevel);
+            return oFile.Read(oChannels, nLevel);
         };
         CopyPixels({{&moSource, Open, oPositions}}, {*poWriter, nLevel}, oAll, oCounter, moTarget.GetExecutor());
     }
