@@ -13,6 +13,7 @@
 #include "gobs/raster/raster.h"
 #include "tests/support/facts.h"
 #include "tests/tools/programrun.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
 #include <zlib.h>
@@ -288,7 +289,10 @@ TEST(RealFiles, AgreeWithTheTableOfFacts)
     for (const Facts& oFacts : krv::test::GetFacts())
     {
         SCOPED_TRACE(oFacts["file"]);
-        const std::string file = oFacts.GetPath();
+        // The table is of the files alone, without what lies beside some.
+        const krv::conformance::TempFolder oAlone;
+        const std::string file = oAlone.File(std::filesystem::path(oFacts["file"]).filename());
+        std::filesystem::create_symlink(std::filesystem::absolute(oFacts.GetPath()), file);
         CompareInfo(oFacts, file);
         CompareChecksums(oFacts, file);
         CompareStatistics(oFacts, file);
