@@ -2,6 +2,8 @@
 
 #include "toolkit/exceptions/exceptions.h"
 
+#include <cmath>
+
 namespace krv::gobs
 {
 
@@ -18,6 +20,19 @@ GeocodingInfo Invert(const GeocodingInfo& oInfo)
     if (!oInfo.IsInvertible() || !oInfo.MapToRaster(0, 0, nColumn, nRow))
         throw krv::ParameterException("The transform is singular", krv::ParameterException::eInvalidValue, "oSource");
     return {nColumn, d / nDeterminant, -b / nDeterminant, nRow, -c / nDeterminant, a / nDeterminant};
+}
+
+// Whole numbers that were missed by rounding alone: offsets within a millionth of a pixel, steps within as much over
+// the width of any image.
+GeocodingInfo Snap(const GeocodingInfo& oInfo)
+{
+    const auto Near = [](double n, double nAside)
+    {
+        return std::fabs(n - std::nearbyint(n)) < nAside ? std::nearbyint(n) : n;
+    };
+    constexpr double PIXEL = 1e-6, STEP = 1e-12;
+    return {Near(oInfo.GetXOffset(), PIXEL), Near(oInfo.GetXPerColumn(), STEP), Near(oInfo.GetXPerRow(), STEP),
+            Near(oInfo.GetYOffset(), PIXEL), Near(oInfo.GetYPerColumn(), STEP), Near(oInfo.GetYPerRow(), STEP)};
 }
 
 } // namespace
@@ -48,7 +63,7 @@ AffineMap::AffineMap(const GeocodingInfo& oTerms) : moTerms(oTerms)
 }
 
 AffineMap::AffineMap(const GeocodingInfo& oResult, const GeocodingInfo& oSource)
-    : AffineMap(Compose(oResult, Invert(oSource)))
+    : AffineMap(Snap(Compose(oResult, Invert(oSource))))
 {
 }
 

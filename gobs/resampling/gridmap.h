@@ -30,7 +30,8 @@ public:
     // From columns and rows of the result to those of the source. Throws ParameterException for terms that are not
     // finite and a map that has no inverse.
     explicit AffineMap(const krv::ogc::cs::GeocodingInfo& oTerms);
-    // Between two grids over the same map coordinates: of the result, and of the source. Throws the same.
+    // Between two grids over the same map coordinates: of the result, and of the source. What is a whole number but for
+    // rounding is one. Throws the same.
     AffineMap(const krv::ogc::cs::GeocodingInfo& oResult, const krv::ogc::cs::GeocodingInfo& oSource);
     ~AffineMap() override;
 

@@ -8,9 +8,18 @@
 
 #include <memory>
 #include <string>
+#include <vector>
 
 namespace krv::operations::detail
 {
+
+// Size and channels of a new file.
+struct TargetLayout
+{
+    unsigned int width = 0;
+    unsigned int height = 0;
+    std::vector<krv::gobs::DataType> types;
+};
 
 // The new file while it is being made. What is not finished goes with it.
 class Target
@@ -19,6 +28,9 @@ public:
     // Lays the file out as the user's options say and, where they are silent, as the first source is. Warns of what the
     // format does not keep of that.
     Target(const CopyPlan& oPlan, const TargetForm& oForm, const Progress& oProgress);
+
+    // Lays the file out as the user's options say, and where they are silent as the format does.
+    Target(const TargetLayout& oLayout, const TargetForm& oForm, const Progress& oProgress);
 
     template <typename Facet>
     Facet* Find() const
@@ -52,13 +64,14 @@ public:
     static void Warn(const std::string& message);
 
 private:
-    void Make(const CopyPlan& oPlan, const std::string& options);
-    void MakeByUser(const CopyPlan& oPlan, const TargetForm& oForm, const std::string& options);
-    bool TryMake(const CopyPlan& oPlan, const std::string& options);
+    void Make(const std::string& options);
+    void MakeByUser(const TargetForm& oForm, const std::string& options);
+    bool TryMake(const std::string& options);
     void MakeLikeSource(const CopyPlan& oPlan, const TargetForm& oForm);
 
     std::string moName;
     std::string moFormat;
+    TargetLayout moLayout;
     Progress moProgress;
     bool mbNew; // nothing had the name before
     std::unique_ptr<krv::datasources::IDataset> mpoDataset;
