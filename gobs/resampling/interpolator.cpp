@@ -64,10 +64,18 @@ public:
     {
         if (IsKernel(moRule.meMethod))
             return RunKernel(oWindow, pX, pY, nCount, pPixels, pValid);
-        std::memset(pValid, 1, nCount * mnChannels);
-        bool bAll = true;
+        bool bAll = true, bMarked = false;
         for (std::size_t n = 0; n < nCount; ++n)
+        {
+            if (moRule.meMethod == Resampling::eNearest && oWindow.mpValid == nullptr)
+                n += TakePlain(oWindow, pX + n, pY + n, nCount - n, pPixels + n * GetPixelBytes());
+            if (n == nCount)
+                break;
+            if (!bMarked)
+                std::memset(pValid, 1, nCount * mnChannels);
+            bMarked = true;
             bAll = MakePixel(oWindow, pX[n], pY[n], pPixels + n * GetPixelBytes(), pValid + n * mnChannels) && bAll;
+        }
         return bAll;
     }
 
@@ -197,6 +205,48 @@ private:
             return true;
         std::memcpy(pValid, oWindow.mpValid + IndexOf(oWindow, nColumn, nRow) * mnChannels, mnChannels);
         return std::memchr(pValid, 0, mnChannels) == nullptr;
+    }
+
+    // Takes the pixels at places inside the window up to the first that is not, and says how many.
+    std::size_t TakePlain(const InterpolationWindow& oWindow, const double* pX, const double* pY, std::size_t nCount,
+                          unsigned char* pPixels) const
+    {
+        switch (GetPixelBytes())
+        {
+        case 1:
+            return TakeBytes<1>(oWindow, pX, pY, nCount, pPixels);
+        case 2:
+            return TakeBytes<2>(oWindow, pX, pY, nCount, pPixels);
+        case 3:
+            return TakeBytes<3>(oWindow, pX, pY, nCount, pPixels);
+        case 4:
+            return TakeBytes<4>(oWindow, pX, pY, nCount, pPixels);
+        case 6:
+            return TakeBytes<6>(oWindow, pX, pY, nCount, pPixels);
+        case 8:
+            return TakeBytes<8>(oWindow, pX, pY, nCount, pPixels);
+        default:
+            return TakeBytes<0>(oWindow, pX, pY, nCount, pPixels);
+        }
+    }
+
+    template <std::size_t BYTES>
+    std::size_t TakeBytes(const InterpolationWindow& oWindow, const double* pX, const double* pY, std::size_t nCount,
+                          unsigned char* pPixels) const
+    {
+        const std::size_t nBytes = BYTES != 0 ? BYTES : GetPixelBytes();
+        const auto nLeft = static_cast<double>(oWindow.mnX), nTop = static_cast<double>(oWindow.mnY);
+        const auto nWidth = static_cast<double>(oWindow.mnWidth), nHeight = static_cast<double>(oWindow.mnHeight);
+        for (std::size_t n = 0; n < nCount; ++n, pPixels += nBytes)
+        {
+            const double nX = pX[n] - nLeft, nY = pY[n] - nTop;
+            if (!(nX >= 0 && nX < nWidth && nY >= 0 && nY < nHeight))
+                return n;
+            const std::size_t nPixel = static_cast<std::size_t>(static_cast<std::int64_t>(nY)) * oWindow.mnWidth +
+                                       static_cast<std::size_t>(static_cast<std::int64_t>(nX));
+            std::memcpy(pPixels, oWindow.mpPixels + nPixel * nBytes, nBytes);
+        }
+        return nCount;
     }
 
     static bool IsInside(const InterpolationWindow& oWindow, long long nX, long long nY)

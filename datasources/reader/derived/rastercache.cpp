@@ -310,7 +310,7 @@ RasterCache::RasterCache(IRasterReader* poSource, bool bTakeOwnership, const Cac
     poCore->mpoSource.reset(poSource);
     mpoImage = std::make_shared<Image>(poCore, 0, *poSource);
     mpoFront = std::make_unique<Front>(*mpoImage, nullptr);
-    Begin();
+    UseSourceGrid();
     poCore->mpoSource.get_deleter().mbOwned = bTakeOwnership;
 }
 
@@ -325,14 +325,14 @@ RasterCache::RasterCache(Factory oMake, const CacheOptions& oOptions)
     poCore->moMake = std::move(oMake);
     mpoImage = std::make_shared<Image>(poCore, 0, *poFirst);
     mpoFront = std::make_unique<Front>(*mpoImage, std::move(poFirst));
-    Begin();
+    UseSourceGrid();
 }
 
 RasterCache::RasterCache(std::shared_ptr<Core> poCore, unsigned int nLevel, std::unique_ptr<IRasterReader> poLevel)
     : mpoImage(std::make_shared<Image>(std::move(poCore), nLevel, *poLevel)),
       mpoFront(std::make_unique<Front>(*mpoImage, std::move(poLevel)))
 {
-    Begin();
+    UseSourceGrid();
 }
 
 RasterCache::RasterCache(const RasterCache& oOther)
@@ -354,7 +354,7 @@ RasterCache::~RasterCache()
     mpoFront.reset(); // a level's reader is part of the source
 }
 
-void RasterCache::Begin()
+void RasterCache::UseSourceGrid()
 {
     SetGrid(GetWidth(), GetHeight(), mpoImage->mnSourceTileWidth, mpoImage->mnSourceTileHeight);
 }

@@ -92,7 +92,7 @@ private:
     class Front;
 
     RasterCache(std::shared_ptr<Core> poCore, unsigned int nLevel, std::unique_ptr<IRasterReader> poLevel);
-    void Begin();
+    void UseSourceGrid();
 
     std::shared_ptr<Image> mpoImage;
     std::unique_ptr<Front> mpoFront;

@@ -319,6 +319,10 @@ protected:
     bool moBits = false;
 };
 
+class TransformRasterReaderProbe : public ReaderTest
+{
+};
+
 constexpr Resampling METHODS[] = {Resampling::eNearest, Resampling::eBilinear, Resampling::eCubic,
                                   Resampling::eLanczos, Resampling::eAverage,  Resampling::eMode};
 
@@ -463,6 +467,51 @@ TEST_F(TransformRasterReaderTest, TheRecordAndThePlaceMoveAlong)
     EXPECT_EQ(oFilled.GetAuxiliaryData().GetChanMetadataValue("NO_DATA_VALUE", 1), "-7");
     const RasterPtr oRaster(oFilled.ReadRaster(0, 0, 2, 2));
     EXPECT_EQ(*reinterpret_cast<const float*>(oRaster->GetBuffer()), -7);
+}
+
+// A coarser result is made of the coarsest level that is not coarser than it, unless it is to be exact.
+TEST_F(TransformRasterReaderProbe, LevelsServe)
+{
+    moModel->mnWidth = 64;
+    moModel->mnHeight = 48;
+    moModel->moLevels = {2, 4, 8};
+    moModel->moAuxiliary.SetChanMetadataValue("_Overview_4", "valid AVERAGE", 1);
+    moModel->moAuxiliary.SetChanMetadataValue("_Overview_2", "valid NEAREST", 1);
+    moModel->moAuxiliary.SetChanMetadataValue("_Overview_8", "valid MIN", 1);
+    const auto Make = [](double nStep)
+    {
+        return std::make_shared<AffineMap>(GeocodingInfo(0, nStep, 0, 0, 0, nStep));
+    };
+    const auto Pixels = [&](IRasterReader& oSource, double nStep, bool bExact, Resampling eMethod)
+    {
+        TransformRequest oRequest{5, 4, eMethod};
+        oRequest.mbExact = bExact;
+        return ReadPixels(TransformRasterReader(&oSource, Make(nStep), oRequest, false));
+    };
+    BasicReader oSource(moFile, {1});
+    const std::unique_ptr<IOverviewReaderAccessor> oLevels(oSource.GetOverviewReaderAccessor());
+    const std::unique_ptr<IRasterReader> oTwo(oLevels->CreateRasterReader(2)), oFour(oLevels->CreateRasterReader(4));
+    EXPECT_EQ(Pixels(oSource, 12, false, Resampling::eBilinear), Pixels(*oFour, 3, true, Resampling::eBilinear));
+    EXPECT_EQ(Pixels(oSource, 3, false, Resampling::eMode), Pixels(*oTwo, 1.5, true, Resampling::eMode));
+    EXPECT_EQ(Pixels(oSource, 12, false, Resampling::eNearest), Pixels(oSource, 12, true, Resampling::eNearest));
+    EXPECT_NE(Pixels(oSource, 12, false, Resampling::eBilinear), Pixels(oSource, 12, true, Resampling::eBilinear));
+}
+
+TEST_F(TransformRasterReaderProbe, NothingLeaksAtTheNthCall)
+{
+    moModel->moLevels = {2, 4};
+    moModel->moBitmaps = {{1, ""}};
+    const auto poMap = std::make_shared<AffineMap>(GeocodingInfo(0, 5, 0, 0, 0, 5));
+    const auto Use = [&]
+    {
+        auto oOwned = std::make_unique<BasicReader>(moFile, Channels{1, 2});
+        TransformRasterReader oReader(oOwned.get(), poMap, {9, 7, Resampling::eAverage}, true);
+        static_cast<void>(oOwned.release());
+        oReader.SetMargins(20, 3, eMirror);
+        const RasterPtr oTile(oReader.GetRaster(0));
+        static_cast<void>(oReader.ReadValid(*oTile));
+    };
+    FailAtEveryCall(Use, [] {});
 }
 
 TEST_F(TransformRasterReaderTest, BadRequestsAreRefused)
