@@ -6,7 +6,7 @@
 #include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/reader/basicreader.h"
-#include "datasources/reader/ioverviewaccessor.h"
+#include "datasources/reader/derived/totalpowerrasterreader.h"
 #include "datasources/writer/basicwriter.h"
 #include "datasources/writer/defaultwriter.h"
 #include "datasources/writer/irasterwriter.h"
@@ -17,6 +17,7 @@
 #include "operations/copy/detail/copyrecord.h"
 #include "operations/copy/detail/copyvalidity.h"
 #include "operations/copy/detail/keptform.h"
+#include "operations/copy/detail/storereader.h"
 #include "operations/copy/detail/target.h"
 #include "operations/job/exceptions.h"
 #include "operations/job/progress.h"
@@ -39,18 +40,6 @@ using namespace krv::datasources;
 
 namespace
 {
-
-void CheckTarget(const CopyRequest& oRequest, const std::string& target)
-{
-    std::error_code oNone;
-    for (const std::string& source : oRequest.sources)
-    {
-        if (std::filesystem::equivalent(source, target, oNone))
-            throw RequestException(target + " is the file itself; name another for the copy");
-    }
-    if (std::filesystem::exists(target, oNone) && !std::filesystem::is_regular_file(target, oNone))
-        throw krv::DataException(target + " is there and no plain file; name another for the copy");
-}
 
 std::string Of(const CopyPlan& oPlan, std::size_t nSource, const std::string& what)
 {
@@ -232,12 +221,32 @@ bool HasLevels(const SourceFile& oSource)
     return poLevels != nullptr && !poLevels->GetLevels().empty();
 }
 
+void ConvertPower(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress)
+{
+    if (oRequest.sources.size() != 1 || oRequest.type || oRequest.promote)
+        throw RequestException("the power is that of one file, and has a type of its own");
+    const SourceFile oSource(oRequest.sources.front());
+    PowerRequest oPower;
+    oPower.moChannels = oRequest.channels.empty() ? oRequest.channels : oSource.CheckChannels(oRequest.channels);
+    TotalPowerRasterReader oReader(&oSource.GetDataset(), false, oPower);
+    const PixelWindow oWindow =
+        FindWindow(oSource, oRequest.window).value_or(PixelWindow{0, 0, oReader.GetWidth(), oReader.GetHeight()});
+    if (oWindow.width == 0 || oWindow.height == 0 || std::uint64_t{oWindow.x} + oWindow.width > oReader.GetWidth() ||
+        std::uint64_t{oWindow.y} + oWindow.height > oReader.GetHeight())
+        throw RequestException(fmt::format("{}: the window is not inside the image of {} x {} pixels",
+                                           oSource.GetName(), oReader.GetWidth(), oReader.GetHeight()));
+    const Target oTarget(TargetLayout{oWindow.width, oWindow.height, {oReader.GetDataType()}}, oForm, oProgress);
+    StoreReader(oReader, oWindow, oTarget, "convert");
+}
+
 } // namespace
 
 void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress,
              krv::threading::IExecutor* poExecutor)
 {
-    CheckTarget(oRequest, oForm.name);
+    CheckTarget(oRequest.sources, oForm.name);
+    if (oRequest.power)
+        return ConvertPower(oRequest, oForm, oProgress);
     const CopyPlan oPlan(oRequest);
     WarnOfFurtherImages(oPlan);
     const Target oTarget(oPlan, oForm, oProgress, poExecutor);

@@ -3,6 +3,7 @@
 #include "gobs/raster/datatype.h"
 #include "operations/api.h"
 #include "operations/job/progress.h"
+#include "operations/source/mapwindow.h"
 
 #include <optional>
 #include <string>
@@ -16,23 +17,15 @@ class IExecutor;
 namespace krv::operations
 {
 
-// A rectangle of pixels.
-struct PixelWindow
-{
-    unsigned int x = 0;
-    unsigned int y = 0;
-    unsigned int width = 0;
-    unsigned int height = 0;
-};
-
 // What the user wants copied.
 struct CopyRequest
 {
     std::vector<std::string> sources;
     std::vector<unsigned int> channels;      // counted from 1 through all files; empty: all
-    std::optional<PixelWindow> window;       // nothing: the whole image
+    WindowRequest window;                    // nothing: the whole image
     std::optional<krv::gobs::DataType> type; // of all channels; nothing: each keeps its own
     bool promote = false;                    // the smallest type that holds all, in place of `type`
+    bool power = false;                      // the power of a radar scene, one channel, in place of its channels
 };
 
 // How the copy is stored.
@@ -49,9 +42,10 @@ struct TargetForm
 // What the options leave open stays as the first file has it: codec, predictor, blocks and interleaving; a whole image
 // is copied block by block as it is stored, without being decoded. Pixels are never encoded with loss unless the
 // options ask for it, and then a mask says which are valid. Warns of what the target's format cannot hold. A file of
-// that name is replaced when the copy is complete; on a failure, and when the user stops it, nothing changes. The copy
-// is the same, byte for byte, for any number of threads. Throws RequestException for what makes no sense, DataException
-// when the target is one of the sources or no plain file, and what formats throw.
+// that name is replaced when the copy is complete; on a failure, and when the user stops it, nothing changes. Of a
+// radar scene as power only pixels, record, place and validity go over. The copy is the same, byte for byte, for any
+// number of threads. Throws RequestException for what makes no sense, DataException when the target is one of the
+// sources or no plain file, and what formats throw.
 KRV_OPERATIONS_API void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress = {},
                                 krv::threading::IExecutor* poExecutor = nullptr);
 

@@ -1,6 +1,8 @@
 #include "operations/statistics/statistics.h"
 
+#include "datasources/reader/derived/totalpowerrasterreader.h"
 #include "datasources/reader/irasterreader.h"
+#include "datasources/reader/rasterrange.h"
 #include "datasources/reader/validitysource.h"
 #include "gobs/mask/mask.h"
 #include "gobs/mask/samplematch.h"
@@ -506,6 +508,28 @@ std::vector<ChannelStatistics> StatisticsOf(const SourceFile& oFile, const std::
     return oResults;
 }
 
+// Pixels that are not valid are NaN, which is the no-data value.
+std::vector<ChannelStatistics> PowerStatistics(const SourceFile& oFile, const StatisticsRequest& oRequest,
+                                               const Progress& oProgress)
+{
+    krv::datasources::PowerRequest oPower;
+    oPower.moChannels = oRequest.channels.empty() ? oRequest.channels : oFile.CheckChannels(oRequest.channels);
+    krv::datasources::TotalPowerRasterReader oReader(&oFile.GetDataset(), false, oPower);
+    const std::string noData = krv::datasources::GetNoDataText(oReader.GetAuxiliaryData(), 1);
+    const auto poGatherer = StatisticsGatherer::Make(oReader.GetDataType(), krv::datasources::ParseNoData(noData));
+    ProgressCounter oCounter(oProgress, "stats",
+                             krv::gobs::BufferBytes(oReader.GetWidth(), oReader.GetHeight(), 1, oReader.GetDataType()));
+    for (const std::unique_ptr<krv::gobs::Raster> poTile : krv::datasources::RasterRange(oReader))
+    {
+        poGatherer->Add(poTile->GetBuffer(), std::uint64_t{poTile->GetWidth()} * poTile->GetHeight(), 1);
+        oCounter.Advance(poTile->GetBufferSize());
+    }
+    ChannelStatistics oResult = poGatherer->Get();
+    oResult.type = oReader.GetDataType();
+    oResult.noDataText = noData;
+    return {oResult};
+}
+
 } // namespace
 
 StatisticsGatherer::~StatisticsGatherer() = default;
@@ -525,6 +549,8 @@ std::unique_ptr<StatisticsGatherer> StatisticsGatherer::Make(const krv::gobs::Da
 std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile, const StatisticsRequest& oRequest,
                                                  const Progress& oProgress, krv::threading::IExecutor* poExecutor)
 {
+    if (oRequest.power)
+        return PowerStatistics(oFile, oRequest, oProgress);
     const auto oChannels = oFile.CheckChannels(oRequest.channels);
     const unsigned int nAlpha = oRequest.raw ? 0 : krv::datasources::FindAlpha(oFile.GetMetadata());
     std::vector<ChannelStatistics> oResults(oChannels.size());

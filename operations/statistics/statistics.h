@@ -67,6 +67,7 @@ struct StatisticsRequest
 {
     std::vector<unsigned int> channels; // empty: all
     bool raw = false;                   // pixels that the validity mask or alpha leaves out count too
+    bool power = false;                 // of a radar scene's power, one result whose number is 0
 };
 
 // One result for each channel that is asked for, in that order. Throws RequestException for a channel that is not

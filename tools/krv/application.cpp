@@ -128,6 +128,7 @@ int RunApplication(int nArguments, char** pArguments)
     AddLinkVerb(oApp, oSelection);
     AddOverviewsVerb(oApp, oSelection);
     AddMaskVerb(oApp, oSelection);
+    AddWarpVerb(oApp, oSelection);
     AddDoctorVerb(oApp, oSelection);
     RefuseEmptyValues(oApp);
     oApp.footer(FOOTER); // after the verbs, which would take it over

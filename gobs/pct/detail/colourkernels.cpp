@@ -39,7 +39,8 @@ void WithoutAlpha(const Colour* pList, const unsigned char* pValues, std::size_t
 ColourLoop FindColourLoop(std::size_t nValueBytes, bool bAlpha)
 {
 #if defined(__x86_64__)
-    if (nValueBytes == 1 && __builtin_cpu_supports("avx512vbmi") && __builtin_cpu_supports("avx512bw"))
+    if (nValueBytes == 1 && __builtin_cpu_supports("avx512vbmi") && __builtin_cpu_supports("avx512vl") &&
+        __builtin_cpu_supports("avx512bw"))
         return FindAvx512ColourLoop(bAlpha);
 #endif
     if (nValueBytes == 1)

@@ -6,6 +6,8 @@
 
 #include <immintrin.h>
 
+#include <cstring>
+
 namespace krv::gobs::detail
 {
 
@@ -34,78 +36,66 @@ struct PartList
     __m512i maQuarters[4];
 };
 
-// Where the bytes of vector nVector of 192 interleaved ones come from: of red and green as one list of 128 bytes, and
-// which of them are blue.
+// Where the bytes of a vector of interleaved parts come from, two parts at a time: of the first and the second, and
+// which bytes are of the third and fourth.
+template <unsigned int PARTS>
 struct Interleaving
 {
     explicit Interleaving(unsigned int nVector)
     {
-        alignas(64) std::uint8_t aFirst[64], aBlue[64];
+        alignas(64) std::uint8_t aIndices[64];
         for (unsigned int n = 0; n < 64; ++n)
         {
-            const unsigned int nByte = 64 * nVector + n;
-            const unsigned int nPixel = nByte / 3;
-            aFirst[n] = static_cast<std::uint8_t>(nPixel + (nByte % 3 == 1 ? 64 : 0));
-            aBlue[n] = static_cast<std::uint8_t>(nPixel);
-            moIsBlue |= __mmask64{nByte % 3 == 2} << n;
+            const unsigned int nByte = 64 * nVector + n, nPart = nByte % PARTS;
+            aIndices[n] = static_cast<std::uint8_t>(nByte / PARTS + (nPart % 2 == 1 ? 64 : 0));
+            moIsLater |= __mmask64{nPart >= 2} << n;
         }
-        moFirst = _mm512_load_si512(aFirst);
-        moBlue = _mm512_load_si512(aBlue);
+        moIndices = _mm512_load_si512(aIndices);
     }
 
-    __m512i Take(__m512i oRed, __m512i oGreen, __m512i oBlue) const
+    // The third part stands for the fourth where there is none.
+    __m512i Take(const __m512i* pParts) const
     {
-        const __m512i oBoth = _mm512_permutex2var_epi8(oRed, moFirst, oGreen);
-        return _mm512_mask_permutexvar_epi8(oBoth, moIsBlue, moBlue, oBlue);
+        const __m512i oFirst = _mm512_permutex2var_epi8(pParts[0], moIndices, pParts[1]);
+        const __m512i oLater = _mm512_permutex2var_epi8(pParts[2], moIndices, pParts[PARTS - 1]);
+        return _mm512_mask_blend_epi8(moIsLater, oFirst, oLater);
     }
 
-    __m512i moFirst;
-    __m512i moBlue;
-    __mmask64 moIsBlue = 0;
+    __m512i moIndices;
+    __mmask64 moIsLater = 0;
 };
 
-__mmask64 FirstBytes(std::size_t nBytes)
+template <unsigned int PARTS>
+void Run(const Colour* pList, const unsigned char* pValues, std::size_t nValues, unsigned char* pColours)
 {
-    return nBytes >= 64 ? ~__mmask64{0} : (__mmask64{1} << nBytes) - 1;
-}
-
-void StoreBytes(unsigned char* p, __m512i oBytes, std::size_t nFrom, std::size_t nEnd)
-{
-    if (nFrom < nEnd)
-        _mm512_mask_storeu_epi8(p + nFrom, FirstBytes(nEnd - nFrom), oBytes);
-}
-
-void WithoutAlpha(const Colour* pList, const unsigned char* pValues, std::size_t nValues, unsigned char* pColours)
-{
-    const PartList oRed(pList, 0), oGreen(pList, 1), oBlue(pList, 2);
-    const Interleaving aVectors[] = {Interleaving(0), Interleaving(1), Interleaving(2)};
-    for (std::size_t n = 0; n < nValues; n += 64)
+    const PartList aLists[] = {PartList(pList, 0), PartList(pList, 1), PartList(pList, 2), PartList(pList, 3)};
+    const Interleaving<PARTS> aVectors[] = {Interleaving<PARTS>(0), Interleaving<PARTS>(1), Interleaving<PARTS>(2),
+                                            Interleaving<PARTS>(3)};
+    const auto Make = [&](const unsigned char* pFrom, unsigned char* pTo)
     {
-        const std::size_t nCount = nValues - n < 64 ? nValues - n : 64;
-        const __m512i oValues = _mm512_maskz_loadu_epi8(FirstBytes(nCount), pValues + n);
-        const __m512i r = oRed.Find(oValues), g = oGreen.Find(oValues), b = oBlue.Find(oValues);
-        unsigned char* const p = pColours + 3 * n;
-        for (unsigned int nVector = 0; nVector < 3; ++nVector)
-            StoreBytes(p, aVectors[nVector].Take(r, g, b), std::size_t{64} * nVector, 3 * nCount);
-    }
-}
-
-void WithAlpha(const Colour* pList, const unsigned char* pValues, std::size_t nValues, unsigned char* pColours)
-{
-    for (std::size_t n = 0; n < nValues; n += 16)
-    {
-        const auto oMask = static_cast<__mmask16>(FirstBytes(nValues - n));
-        const __m512i oIndices = _mm512_cvtepu8_epi32(_mm_maskz_loadu_epi8(oMask, pValues + n));
-        const __m512i oColours = _mm512_mask_i32gather_epi32(_mm512_setzero_si512(), oMask, oIndices, pList, 4);
-        _mm512_mask_storeu_epi32(pColours + 4 * n, oMask, oColours);
-    }
+        const __m512i oValues = _mm512_loadu_si512(pFrom);
+        __m512i aParts[PARTS];
+        for (unsigned int n = 0; n < PARTS; ++n)
+            aParts[n] = aLists[n].Find(oValues);
+        for (unsigned int n = 0; n < PARTS; ++n)
+            _mm512_storeu_si512(pTo + 64 * n, aVectors[n].Take(aParts));
+    };
+    std::size_t n = 0;
+    for (; n + 64 <= nValues; n += 64)
+        Make(pValues + n, pColours + PARTS * n);
+    if (n == nValues)
+        return;
+    unsigned char aValues[64] = {}, aColours[64 * PARTS];
+    std::memcpy(aValues, pValues + n, nValues - n);
+    Make(aValues, aColours);
+    std::memcpy(pColours + PARTS * n, aColours, PARTS * (nValues - n));
 }
 
 } // namespace
 
 ColourLoop FindAvx512ColourLoop(bool bAlpha)
 {
-    return bAlpha ? WithAlpha : WithoutAlpha;
+    return bAlpha ? Run<4> : Run<3>;
 }
 
 } // namespace krv::gobs::detail

@@ -93,7 +93,7 @@ inline std::uint8_t ModeByCounts(const std::uint8_t* pValues, std::size_t nValue
         return static_cast<std::uint8_t>(std::find(aCounts[0], aCounts[0] + 256, nMost) - aCounts[0]);
 }
 
-// The most frequent of 1 to 65535 values, of several the smallest; NaN above all others, -0 is 0. The values change
+// The most frequent of one or more values, of several the smallest; NaN above all others, -0 is 0. The values change
 // their places.
 template <typename T>
 inline T ModeOf(T* pValues, std::size_t nValues)
@@ -107,7 +107,7 @@ inline T ModeOf(T* pValues, std::size_t nValues)
     {
         if (nValues == 16)
             return ModeOfSixteen(pValues);
-        if (nValues > 16)
+        if (nValues > 16 && nValues < 65536)
             return nValues < 256 ? ModeByCounts<std::uint8_t>(pValues, nValues)
                                  : ModeByCounts<std::uint16_t>(pValues, nValues);
     }

@@ -81,8 +81,9 @@ void CopyPlan::ChooseChannels(const std::vector<unsigned int>& oWanted)
         moChannels = std::move(oAll);
 }
 
-void CopyPlan::ChooseWindow(const std::optional<PixelWindow>& oWanted)
+void CopyPlan::ChooseWindow(const WindowRequest& oRequest)
 {
+    const auto oWanted = FindWindow(*moSources.front(), oRequest);
     const unsigned int nWidth = moSources.front()->GetRaster().GetWidth();
     const unsigned int nHeight = moSources.front()->GetRaster().GetHeight();
     moWindow = oWanted.value_or(PixelWindow{0, 0, nWidth, nHeight});

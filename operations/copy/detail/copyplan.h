@@ -49,7 +49,7 @@ public:
 private:
     void CheckSizes() const;
     void ChooseChannels(const std::vector<unsigned int>& oWanted);
-    void ChooseWindow(const std::optional<PixelWindow>& oWanted);
+    void ChooseWindow(const WindowRequest& oRequest);
     void ChooseTypes(const CopyRequest& oRequest);
     void WarnOfLosses();
 

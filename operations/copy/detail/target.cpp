@@ -68,14 +68,23 @@ void Target::Warn(const std::string& message)
     krv::nspio::Warning::Warn(message);
 }
 
+Target::Target(const TargetLayout& oLayout, const TargetForm& oForm, const Progress& oProgress)
+    : moName(oForm.name), moFormat(ChooseFormat(oForm)), moLayout(oLayout), moProgress(oProgress), mpoExecutor(nullptr),
+      mbChecked(oForm.check), mbNew(!std::filesystem::exists(oForm.name))
+{
+    MakeByUser(oForm, oForm.options);
+}
+
 Target::Target(const CopyPlan& oPlan, const TargetForm& oForm, const Progress& oProgress,
                krv::threading::IExecutor* poExecutor)
-    : moName(oForm.name), moFormat(ChooseFormat(oForm)), moProgress(oProgress), mpoExecutor(poExecutor),
-      mbChecked(oForm.check), mbNew(!std::filesystem::exists(oForm.name))
+    : moName(oForm.name),
+      moFormat(ChooseFormat(oForm)), moLayout{oPlan.GetWindow().width, oPlan.GetWindow().height, oPlan.GetTypes()},
+      moProgress(oProgress), mpoExecutor(poExecutor), mbChecked(oForm.check),
+      mbNew(!std::filesystem::exists(oForm.name))
 {
     if (const auto oMoved = FindMovedForm(oPlan, oForm.options))
     {
-        MakeByUser(oPlan, oForm, WithoutForm(oForm.options));
+        MakeByUser(oForm, WithoutForm(oForm.options));
         auto* const poBlocks = Find<IEncodedBlocks>();
         mbTakesBlocks = poBlocks != nullptr && poBlocks->SetEncodedForm(1, *oMoved);
     }
@@ -89,7 +98,7 @@ bool Target::IsLossy() const
     return poBlocks != nullptr && poBlocks->GetEncodedForm(1).mbLossy;
 }
 
-void Target::Make(const CopyPlan& oPlan, const std::string& options)
+void Target::Make(const std::string& options)
 {
     // The one before goes first: both have the same name. It was a trial, of which nothing is lost.
     if (Find<INewFileDataset>() != nullptr)
@@ -102,14 +111,14 @@ void Target::Make(const CopyPlan& oPlan, const std::string& options)
     mpoRaster = dynamic_cast<IRasterDataset*>(mpoDataset.get());
     if (mpoRaster == nullptr)
         throw krv::DataException(moName + ": the format does not hold images");
-    mpoRaster->Create(oPlan.GetWindow().width, oPlan.GetWindow().height, oPlan.GetTypes());
+    mpoRaster->Create(moLayout.width, moLayout.height, moLayout.types);
 }
 
-bool Target::TryMake(const CopyPlan& oPlan, const std::string& options)
+bool Target::TryMake(const std::string& options)
 {
     try
     {
-        Make(oPlan, options);
+        Make(options);
         return true;
     }
     catch (const krv::DataException&)
@@ -119,14 +128,14 @@ bool Target::TryMake(const CopyPlan& oPlan, const std::string& options)
 }
 
 // What a format holds against the options that it was given is a matter of the command line.
-void Target::MakeByUser(const CopyPlan& oPlan, const TargetForm& oForm, const std::string& options)
+void Target::MakeByUser(const TargetForm& oForm, const std::string& options)
 {
-    const auto oTypes = oPlan.GetTypes();
+    const auto& oTypes = moLayout.types;
     const bool bMixed =
         std::any_of(oTypes.begin(), oTypes.end(), [&](const auto& oType) { return oType != oTypes.front(); });
     try
     {
-        Make(oPlan, options);
+        Make(options);
     }
     catch (const krv::DataException& oError)
     {
@@ -159,22 +168,22 @@ void Target::MakeLikeSource(const CopyPlan& oPlan, const TargetForm& oForm)
     std::string all = options;
     for (const KeptOption& oOption : oKept)
         all = Joined(all, oOption.options);
-    bool bMade = !oKept.empty() && TryMake(oPlan, all);
+    bool bMade = !oKept.empty() && TryMake(all);
     for (std::size_t nAt = 0; nAt < oKept.size() && !bMade; ++nAt)
     {
         const KeptOption& oOption = oKept[nAt];
-        if (TryMake(oPlan, Joined(options, oOption.options)))
+        if (TryMake(Joined(options, oOption.options)))
         {
             options = Joined(options, oOption.options);
             continue;
         }
         if (!oOption.what.empty())
             oLeft.push_back(oOption.what);
-        if (!oOption.instead.empty() && TryMake(oPlan, Joined(options, oOption.instead)))
+        if (!oOption.instead.empty() && TryMake(Joined(options, oOption.instead)))
             options = Joined(options, oOption.instead);
     }
     if (!bMade)
-        MakeByUser(oPlan, oForm, options);
+        MakeByUser(oForm, options);
     const auto oForms = FindForm(oPlan.GetSource(0));
     const bool bAsked = ParseOptions(oForm.options).contains("COMPRESS");
     if (oForms && oForms->mbLossy && !bAsked)

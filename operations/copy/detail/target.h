@@ -9,9 +9,18 @@
 
 #include <memory>
 #include <string>
+#include <vector>
 
 namespace krv::operations::detail
 {
+
+// Size and channels of a new file.
+struct TargetLayout
+{
+    unsigned int width = 0;
+    unsigned int height = 0;
+    std::vector<krv::gobs::DataType> types;
+};
 
 // The new file while it is being made. What is not finished goes with it.
 class Target
@@ -21,6 +30,9 @@ public:
     // format does not keep of that.
     Target(const CopyPlan& oPlan, const TargetForm& oForm, const Progress& oProgress,
            krv::threading::IExecutor* poExecutor);
+
+    // Lays the file out as the user's options say, and where they are silent as the format does.
+    Target(const TargetLayout& oLayout, const TargetForm& oForm, const Progress& oProgress);
 
     template <typename Facet>
     Facet* Find() const
@@ -58,13 +70,14 @@ public:
     static void Warn(const std::string& message);
 
 private:
-    void Make(const CopyPlan& oPlan, const std::string& options);
-    void MakeByUser(const CopyPlan& oPlan, const TargetForm& oForm, const std::string& options);
-    bool TryMake(const CopyPlan& oPlan, const std::string& options);
+    void Make(const std::string& options);
+    void MakeByUser(const TargetForm& oForm, const std::string& options);
+    bool TryMake(const std::string& options);
     void MakeLikeSource(const CopyPlan& oPlan, const TargetForm& oForm);
 
     std::string moName;
     std::string moFormat;
+    TargetLayout moLayout;
     Progress moProgress;
     krv::threading::IExecutor* mpoExecutor;
     bool mbChecked;

@@ -22,8 +22,9 @@ struct Options
 {
     std::vector<std::string> files;
     std::string channels;
-    std::string window;
+    WindowOptions window;
     std::string type;
+    bool power = false;
     TargetForm form;
 };
 
@@ -41,22 +42,14 @@ krv::gobs::DataType ParseType(const std::string& given)
     throw UsageError("--type: \"" + text + "\" is none of promoted" + all);
 }
 
-PixelWindow ParseWindow(const std::string& text)
-{
-    const auto oNumbers = ParseNumbers(text, "--window");
-    if (oNumbers.size() != 4)
-        throw UsageError("--window: \"" + text + "\" is not of the form x,y,width,height");
-    return {oNumbers[0], oNumbers[1], oNumbers[2], oNumbers[3]};
-}
-
 int RunConvert(Options& oOptions)
 {
     CopyRequest oRequest;
     oOptions.form.name = oOptions.files.back();
     oRequest.sources.assign(oOptions.files.begin(), oOptions.files.end() - 1);
     oRequest.channels = ParseNumbers(oOptions.channels, "--channels");
-    if (!oOptions.window.empty())
-        oRequest.window = ParseWindow(oOptions.window);
+    oRequest.window = ParseWindow(oOptions.window, "--window");
+    oRequest.power = oOptions.power;
     oRequest.promote = oOptions.type == "promoted";
     if (!oOptions.type.empty() && !oRequest.promote)
         oRequest.type = ParseType(oOptions.type);
@@ -76,7 +69,8 @@ void AddConvertVerb(CLI::App& oApp, Selection& oSelection)
         ->expected(2, std::numeric_limits<int>::max());
     poVerb->add_option("--channels", poOptions->channels,
                        "Only these, in this order, such as 3,1; counted through all files");
-    poVerb->add_option("--window", poOptions->window, "Only this part: x,y,width,height in pixels");
+    AddWindowOptions(*poVerb, poOptions->window, "--window", "Only this part");
+    poVerb->add_flag("--power", poOptions->power, "The power of a radar scene in place of its channels");
     poVerb->add_option("--type", poOptions->type,
                        "Values of this type, such as 16S, or of the smallest that holds all: promoted");
     poVerb->add_option("--format", poOptions->form.format,

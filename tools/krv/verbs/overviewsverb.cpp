@@ -20,6 +20,7 @@
 #include <algorithm>
 #include <exception>
 #include <memory>
+#include <optional>
 
 namespace krv::tool
 {
@@ -38,7 +39,7 @@ struct Options
 {
     std::string levels;
     std::string resampling;
-    std::string changed;
+    WindowOptions changed;
     OverviewOptions building;
 };
 
@@ -69,14 +70,14 @@ std::vector<unsigned int> ParseLevels(const std::string& text)
     return oLevels;
 }
 
-void SetChanged(const std::string& text, OverviewOptions& oOptions)
+void SetChanged(const std::string& file, const WindowOptions& oWindow, OverviewOptions& oOptions)
 {
-    const auto oNumbers = ParseNumbers(text, "--changed");
-    if (oNumbers.empty())
-        return;
-    if (oNumbers.size() != 4)
-        throw UsageError("--changed: \"" + text + "\" is not x,y,width,height");
-    oOptions.moChanged = OverviewOptions::Rectangle{oNumbers[0], oNumbers[1], oNumbers[2], oNumbers[3]};
+    const WindowRequest oRequest = ParseWindow(oWindow, "--changed");
+    std::optional<PixelWindow> oPart = oRequest.pixels;
+    if (!oPart && (oRequest.bounds || !oRequest.like.empty()))
+        oPart = FindWindow(SourceFile(file), oRequest);
+    if (oPart)
+        oOptions.moChanged = OverviewOptions::Rectangle{oPart->x, oPart->y, oPart->width, oPart->height};
 }
 
 void CheckChanged(const std::string& file, const OverviewOptions& oOptions, unsigned int nWidth, unsigned int nHeight)
@@ -144,7 +145,7 @@ void Build(BasicWriter& oWriter, const std::vector<unsigned int>& oLevels, const
 int RunOverviews(const std::string& file, Options& oOptions)
 {
     auto oLevels = ParseLevels(oOptions.levels);
-    SetChanged(oOptions.changed, oOptions.building);
+    SetChanged(file, oOptions.changed, oOptions.building);
     const SourceFile oFile(file);
     const unsigned int nWidth = oFile.GetRaster().GetWidth(), nHeight = oFile.GetRaster().GetHeight();
     const std::vector<ChannelGroup> oGroups = oFile.GroupByType(oFile.CheckChannels({}));
@@ -189,8 +190,8 @@ void AddOverviewsVerb(CLI::App& oApp, Selection& oSelection)
                      "max")
         ->check(CLI::IsMember({"average", "nearest", "mode", "bilinear", "cubic", "lanczos", "rms", "min", "max"},
                               CLI::ignore_case));
-    poVerb->add_option("--changed", poOptions->changed,
-                       "x,y,width,height: only this part of the image changed since its levels were built");
+    AddWindowOptions(*poVerb, poOptions->changed, "--changed",
+                     "Only this part of the image changed since its levels were built");
     poVerb->add_flag("--half-valid", poOptions->building.mbHalfValid,
                      "A pixel counts as valid when half of its source pixels are, instead of one");
     poVerb->add_flag("--nan-is-nodata", poOptions->building.mbNaNIsNoData, "Values that are no numbers are not valid");

@@ -21,6 +21,7 @@ struct Options
 {
     std::string channels;
     bool raw = false;
+    bool power = false;
     bool json = false;
 };
 
@@ -87,7 +88,8 @@ std::string Table(const Json& oRows)
 
 int RunStats(const std::string& file, const Options& oOptions)
 {
-    const operations::StatisticsRequest oRequest{ParseNumbers(oOptions.channels, "--channels"), oOptions.raw};
+    const operations::StatisticsRequest oRequest{ParseNumbers(oOptions.channels, "--channels"), oOptions.raw,
+                                                 oOptions.power};
     const operations::SourceFile oFile(file);
     Json oRows = Json::array();
     for (const auto& oStatistics : operations::ComputeStatistics(oFile, oRequest, ShowProgress(), GetExecutor()))
@@ -113,6 +115,7 @@ void AddStatsVerb(CLI::App& oApp, Selection& oSelection)
     poVerb->add_flag("--json", poOptions->json, "As JSON; 64-bit integers are exact");
     poVerb->add_flag("--raw", poOptions->raw,
                      "Count pixels that the validity mask or the alpha channel leaves out too");
+    poVerb->add_flag("--power", poOptions->power, "Of the power of a radar scene, all channels together");
     poVerb->footer("No-data values, pixels that the validity mask or the alpha channel leaves out, NaN and infinities "
                    "take no part. Complex channels: of the magnitude.");
     poVerb->callback(

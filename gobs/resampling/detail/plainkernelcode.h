@@ -1,0 +1,319 @@
+#pragma once
+
+// The inner loops of interpolation. One source file for each instruction set includes this and is compiled with options
+// of its own, so everything here is local to the file and calls nothing that is not. The samples of a pixel, or the
+// four pixels of a row, lie in the lanes of a vector of four.
+
+#include "gobs/resampling/detail/plainkernels.h"
+
+#include <cstdint>
+#include <cstring>
+#include <type_traits>
+
+#ifdef __SSE4_1__
+#include <immintrin.h>
+#endif
+
+namespace krv::gobs::detail
+{
+
+namespace
+{
+
+typedef float Floats __attribute__((vector_size(16)));      // NOLINT: an attribute of the typedef
+typedef std::int32_t Ints __attribute__((vector_size(16))); // NOLINT
+
+constexpr std::size_t BLOCK = 128;
+
+inline Floats Spread(float n)
+{
+    return Floats{n, n, n, n};
+}
+inline Floats SmallerOf(const Floats& a, const Floats& b)
+{
+    return a < b ? a : b;
+}
+inline Floats LargerOf(const Floats& a, const Floats& b)
+{
+    return a > b ? a : b;
+}
+
+// N samples as floats; what is in the other lanes does not matter. Reads four.
+template <typename T>
+inline Floats LoadSamples(const T* p)
+{
+    if constexpr (std::is_same_v<T, float>)
+    {
+        Floats o;
+        std::memcpy(&o, p, sizeof o);
+        return o;
+    }
+#ifdef __SSE4_1__
+    else if constexpr (sizeof(T) == 1)
+    {
+        int nBytes;
+        std::memcpy(&nBytes, p, sizeof nBytes);
+        return _mm_cvtepi32_ps(_mm_cvtepu8_epi32(_mm_cvtsi32_si128(nBytes)));
+    }
+    else
+    {
+        const __m128i oWords = _mm_loadl_epi64(reinterpret_cast<const __m128i*>(p));
+        return _mm_cvtepi32_ps(std::is_signed_v<T> ? _mm_cvtepi16_epi32(oWords) : _mm_cvtepu16_epi32(oWords));
+    }
+#else
+    else
+        return Floats{static_cast<float>(p[0]), static_cast<float>(p[1]), static_cast<float>(p[2]),
+                      static_cast<float>(p[3])};
+#endif
+}
+
+template <typename T>
+inline T RoundSample(float n)
+{
+    if constexpr (std::is_same_v<T, float>)
+        return n;
+    else
+    {
+        constexpr float LOWEST = std::is_signed_v<T> ? -32768.0F : 0.0F;
+        constexpr float MOST = sizeof(T) == 1 ? 255.0F : (std::is_signed_v<T> ? 32767.0F : 65535.0F);
+        const float nRounded = __builtin_rintf(n);
+        return static_cast<T>(nRounded < LOWEST ? LOWEST : (nRounded > MOST ? MOST : nRounded));
+    }
+}
+
+// Four samples rounded half to even and saturated.
+template <typename T>
+inline void StoreFour(T* p, const Floats& oValues)
+{
+    if constexpr (std::is_same_v<T, float>)
+        std::memcpy(p, &oValues, sizeof oValues);
+#ifdef __SSE4_1__
+    else
+    {
+        const __m128i oInts = _mm_cvtps_epi32(oValues);
+        const __m128i oWords = std::is_signed_v<T> ? _mm_packs_epi32(oInts, oInts) : _mm_packus_epi32(oInts, oInts);
+        if constexpr (sizeof(T) == 1)
+        {
+            const int nBytes = _mm_cvtsi128_si32(_mm_packus_epi16(oWords, oWords));
+            std::memcpy(p, &nBytes, 4);
+        }
+        else
+            _mm_storel_epi64(reinterpret_cast<__m128i*>(p), oWords);
+    }
+#else
+    else
+        for (int n = 0; n < 4; ++n)
+            p[n] = RoundSample<T>(oValues[n]);
+#endif
+}
+
+// What is behind N samples is overwritten by the next pixel, unless this is the last one.
+template <typename T, std::size_t N>
+inline void StorePixel(T* p, const Floats& oValues, bool bLast)
+{
+    if (N == 4 || (N > 1 && !bLast))
+        return StoreFour(p, oValues);
+    T aValues[4];
+    StoreFour(aValues, oValues);
+    std::memcpy(p, aValues, N * sizeof(T));
+}
+
+// Whole pixels and fractions of a block of places along one axis.
+struct Places
+{
+    void Find(const double* p, double nFirst, std::size_t nCount)
+    {
+        for (std::size_t n = 0; n < nCount; ++n)
+        {
+            const double nPlace = p[n] - nFirst;
+            maPixels[n] = static_cast<std::int32_t>(nPlace);
+            maFractions[n] = nPlace - maPixels[n];
+        }
+    }
+
+    std::int32_t maPixels[BLOCK];
+    double maFractions[BLOCK];
+};
+
+struct CubicWeights
+{
+    void Find(const double* pFractions, std::size_t nCount)
+    {
+        for (std::size_t n = 0; n < nCount; ++n)
+        {
+            const double f = pFractions[n];
+            maWeights[n][0] = static_cast<float>(((-0.5 * f + 1) * f - 0.5) * f);
+            maWeights[n][1] = static_cast<float>((1.5 * f - 2.5) * f * f + 1);
+            maWeights[n][2] = static_cast<float>(((-1.5 * f + 2) * f + 0.5) * f);
+            maWeights[n][3] = static_cast<float>((0.5 * f - 0.5) * f * f);
+        }
+    }
+
+    alignas(16) float maWeights[BLOCK][4];
+};
+
+template <typename T, std::size_t N>
+struct Bilinear
+{
+    static void RunBlock(const PlainJob& oJob, std::size_t nFrom, std::size_t nCount)
+    {
+        Places oX, oY;
+        oX.Find(oJob.mpX + nFrom, oJob.mnLeft, nCount);
+        oY.Find(oJob.mpY + nFrom, oJob.mnTop, nCount);
+        const T* const pPixels = reinterpret_cast<const T*>(oJob.mpPixels);
+        T* const pResult = reinterpret_cast<T*>(oJob.mpResult) + nFrom * N;
+        for (std::size_t n = 0; n < nCount; ++n)
+        {
+            const T* const p = pPixels + static_cast<std::size_t>(oY.maPixels[n]) * oJob.mnRowSamples +
+                               static_cast<std::size_t>(oX.maPixels[n]) * N;
+            const T* const q = p + oJob.mnRowSamples;
+            const auto fx = static_cast<float>(oX.maFractions[n]), fy = static_cast<float>(oY.maFractions[n]);
+            if constexpr (N == 1)
+            {
+                const auto nAbove =
+                    static_cast<float>(p[0]) + fx * (static_cast<float>(p[1]) - static_cast<float>(p[0]));
+                const auto nBelow =
+                    static_cast<float>(q[0]) + fx * (static_cast<float>(q[1]) - static_cast<float>(q[0]));
+                pResult[n] = RoundSample<T>(nAbove + fy * (nBelow - nAbove));
+            }
+            else
+            {
+                const Floats oFx = Spread(fx), oFy = Spread(fy);
+                const Floats a = LoadSamples(p), b = LoadSamples(p + N), c = LoadSamples(q), d = LoadSamples(q + N);
+                const Floats oAbove = a + oFx * (b - a), oBelow = c + oFx * (d - c);
+                StorePixel<T, N>(pResult + n * N, oAbove + oFy * (oBelow - oAbove), n + 1 == nCount);
+            }
+        }
+    }
+};
+
+template <typename T, std::size_t N>
+struct Cubic
+{
+    static void RunBlock(const PlainJob& oJob, std::size_t nFrom, std::size_t nCount)
+    {
+        Places oX, oY;
+        CubicWeights oXWeights, oYWeights;
+        oX.Find(oJob.mpX + nFrom, oJob.mnLeft, nCount);
+        oY.Find(oJob.mpY + nFrom, oJob.mnTop, nCount);
+        oXWeights.Find(oX.maFractions, nCount);
+        oYWeights.Find(oY.maFractions, nCount);
+        const T* const pPixels = reinterpret_cast<const T*>(oJob.mpPixels);
+        T* const pResult = reinterpret_cast<T*>(oJob.mpResult) + nFrom * N;
+        for (std::size_t n = 0; n < nCount; ++n)
+        {
+            const T* const p = pPixels + static_cast<std::size_t>(oY.maPixels[n] - 1) * oJob.mnRowSamples +
+                               static_cast<std::size_t>(oX.maPixels[n] - 1) * N;
+            const float *const pXWeights = oXWeights.maWeights[n], *const pYWeights = oYWeights.maWeights[n];
+            if (pXWeights[2] == 0 || pYWeights[2] == 0)
+                StorePixel<T, N>(pResult + n * N, AddOnGrid(p, oJob.mnRowSamples, pXWeights, pYWeights, oJob.mbClamp),
+                                 true);
+            else if constexpr (N == 1)
+                pResult[n] = RoundSample<T>(AddTaps(p, oJob.mnRowSamples, pXWeights, pYWeights, oJob.mbClamp));
+            else
+                StorePixel<T, N>(pResult + n * N, AddPixels(p, oJob.mnRowSamples, pXWeights, pYWeights, oJob.mbClamp),
+                                 n + 1 == nCount);
+        }
+    }
+
+    // Places in the middle of a row or column of pixels: the other rows and columns weigh nothing and do not count.
+    static Floats AddOnGrid(const T* p, std::size_t nRow, const float* pX, const float* pY, bool bClamp)
+    {
+        Floats oSum{}, oLow = LoadSamples(p + nRow + N), oHigh = oLow;
+        for (std::size_t y = 0; y < 4; ++y)
+        {
+            for (std::size_t x = 0; x < 4; ++x)
+            {
+                if (pX[x] == 0 || pY[y] == 0)
+                    continue;
+                const Floats oPixel = LoadSamples(p + y * nRow + x * N);
+                oSum += Spread(pX[x] * pY[y]) * oPixel;
+                oLow = SmallerOf(oLow, oPixel);
+                oHigh = LargerOf(oHigh, oPixel);
+            }
+        }
+        return bClamp ? LargerOf(SmallerOf(oSum, oHigh), oLow) : oSum;
+    }
+
+    // The pixels of a row in the lanes.
+    static float AddTaps(const T* p, std::size_t nRow, const float* pX, const float* pY, bool bClamp)
+    {
+        Floats oSum{}, oLow = LoadSamples(p), oHigh = oLow;
+        for (std::size_t n = 0; n < 4; ++n)
+        {
+            const Floats oTaps = LoadSamples(p + n * nRow);
+            oSum += Spread(pY[n]) * oTaps;
+            oLow = SmallerOf(oTaps, oLow);
+            oHigh = LargerOf(oTaps, oHigh);
+        }
+        Floats oWeights;
+        std::memcpy(&oWeights, pX, sizeof oWeights);
+        oSum *= oWeights;
+        const float nSum = (oSum[0] + oSum[2]) + (oSum[1] + oSum[3]);
+        if (!bClamp)
+            return nSum;
+        oLow = SmallerOf(oLow, __builtin_shufflevector(oLow, oLow, 2, 3, 0, 1));
+        oHigh = LargerOf(oHigh, __builtin_shufflevector(oHigh, oHigh, 2, 3, 0, 1));
+        const float nLow = oLow[0] < oLow[1] ? oLow[0] : oLow[1], nHigh = oHigh[0] > oHigh[1] ? oHigh[0] : oHigh[1];
+        return nSum < nLow ? nLow : (nSum > nHigh ? nHigh : nSum);
+    }
+
+    // The samples of a pixel in the lanes.
+    static Floats AddPixels(const T* p, std::size_t nRow, const float* pX, const float* pY, bool bClamp)
+    {
+        Floats oSum{}, oLow = LoadSamples(p), oHigh = oLow;
+        for (std::size_t y = 0; y < 4; ++y, p += nRow)
+        {
+            const Floats a = LoadSamples(p), b = LoadSamples(p + N), c = LoadSamples(p + 2 * N),
+                         d = LoadSamples(p + 3 * N);
+            oSum += Spread(pY[y]) * ((Spread(pX[0]) * a + Spread(pX[1]) * b) + (Spread(pX[2]) * c + Spread(pX[3]) * d));
+            oLow = SmallerOf(SmallerOf(oLow, SmallerOf(a, b)), SmallerOf(c, d));
+            oHigh = LargerOf(LargerOf(oHigh, LargerOf(a, b)), LargerOf(c, d));
+        }
+        return bClamp ? LargerOf(SmallerOf(oSum, oHigh), oLow) : oSum;
+    }
+};
+
+template <typename Block>
+inline void RunBlocks(const PlainJob& oJob)
+{
+    for (std::size_t n = 0; n < oJob.mnCount; n += BLOCK)
+        Block::RunBlock(oJob, n, oJob.mnCount - n < BLOCK ? oJob.mnCount - n : BLOCK);
+}
+
+template <template <typename, std::size_t> class Kernel, typename T>
+inline PlainLoop FindForSamples(std::size_t nSamples)
+{
+    constexpr PlainLoop LOOPS[] = {RunBlocks<Kernel<T, 1>>, RunBlocks<Kernel<T, 2>>, RunBlocks<Kernel<T, 3>>,
+                                   RunBlocks<Kernel<T, 4>>};
+    return nSamples >= 1 && nSamples <= MOST_PLAIN_SAMPLES ? LOOPS[nSamples - 1] : nullptr;
+}
+
+template <template <typename, std::size_t> class Kernel>
+inline PlainLoop FindForType(NativeDataTypeCode ePart, std::size_t nSamples)
+{
+    switch (ePart)
+    {
+    case eDT_8U:
+        return FindForSamples<Kernel, std::uint8_t>(nSamples);
+    case eDT_16U:
+        return FindForSamples<Kernel, std::uint16_t>(nSamples);
+    case eDT_16S:
+        return FindForSamples<Kernel, std::int16_t>(nSamples);
+    case eDT_32R:
+        return FindForSamples<Kernel, float>(nSamples);
+    default:
+        return nullptr;
+    }
+}
+
+inline PlainLoop FindFor(Resampling eMethod, NativeDataTypeCode ePart, std::size_t nSamples)
+{
+    if (eMethod == Resampling::eBilinear)
+        return FindForType<Bilinear>(ePart, nSamples);
+    return eMethod == Resampling::eCubic ? FindForType<Cubic>(ePart, nSamples) : nullptr;
+}
+
+} // namespace
+
+} // namespace krv::gobs::detail

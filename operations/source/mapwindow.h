@@ -1,0 +1,55 @@
+#pragma once
+
+#include "operations/api.h"
+#include "toolkit/ogc/cs/geocodinginfo.h"
+
+#include <optional>
+#include <string>
+
+namespace krv::operations
+{
+
+class SourceFile;
+
+// A rectangle of pixels.
+struct PixelWindow
+{
+    unsigned int x = 0;
+    unsigned int y = 0;
+    unsigned int width = 0;
+    unsigned int height = 0;
+};
+
+// A rectangle in the map coordinates of a file's own reference system.
+struct MapBounds
+{
+    double west = 0;
+    double south = 0;
+    double east = 0;
+    double north = 0;
+};
+
+// Which part of a file's image a user means: pixels, map coordinates, or where another file lies. At most one of them.
+struct WindowRequest
+{
+    std::optional<PixelWindow> pixels = {};
+    std::optional<MapBounds> bounds = {};
+    std::string like = {}; // a file in the same reference system; empty: none
+};
+
+// The transform of a file. Throws RequestException for a file without one: with the identity, which says nothing.
+KRV_OPERATIONS_API krv::ogc::cs::GeocodingInfo RequireGeocoding(const SourceFile& oFile);
+
+// The smallest rectangle that holds the image of so many pixels.
+KRV_OPERATIONS_API MapBounds OutlineOf(const krv::ogc::cs::GeocodingInfo& oInfo, double nWidth, double nHeight);
+
+// Where another file lies. Throws RequestException when both have reference systems that differ.
+KRV_OPERATIONS_API MapBounds BoundsLike(const SourceFile& oFile, const SourceFile& oOther);
+// Throws RequestException when both have reference systems and these differ.
+KRV_OPERATIONS_API void CheckSameSystem(const SourceFile& oFile, const SourceFile& oOther);
+
+// The pixels of the image that are touched, those that are no more than a millionth aside; nothing when the request
+// asks for nothing, the rectangle of pixels as it is. Throws RequestException for bounds that hold no pixel.
+KRV_OPERATIONS_API std::optional<PixelWindow> FindWindow(const SourceFile& oFile, const WindowRequest& oRequest);
+
+} // namespace krv::operations
