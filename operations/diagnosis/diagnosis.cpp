@@ -13,6 +13,7 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/interfaces/isidecardataset.h"
+#include "datasources/interfaces/iverifieddataset.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/basicreader.h"
@@ -28,6 +29,7 @@
 
 #include <fmt/format.h>
 
+#include <algorithm>
 #include <array>
 #include <filesystem>
 #include <fstream>
@@ -330,6 +332,23 @@ bool CheckLinks(const IDataset& oDataset, const std::string& subject, std::vecto
     return bThere;
 }
 
+// A file that carries checksums is read to its last byte; each place that is wrong is named, up to a screenful.
+void CompareChecksums(IDataset& oDataset, const std::string& subject, std::vector<Finding>& oFindings)
+{
+    constexpr std::size_t MOST_NAMED = 20;
+    auto* const poVerified = dynamic_cast<IVerifiedDataset*>(&oDataset);
+    if (poVerified == nullptr)
+        return;
+    const std::vector<std::string> oWrong = poVerified->Verify({});
+    if (oWrong.empty())
+        return oFindings.push_back({true, subject, "all checksums of the file are right", {}});
+    for (std::size_t nAt = 0; nAt < std::min(oWrong.size(), MOST_NAMED); ++nAt)
+        oFindings.push_back({false, subject, oWrong[nAt], DAMAGE_REMEDY});
+    if (oWrong.size() > MOST_NAMED)
+        oFindings.push_back(
+            {false, subject, fmt::format("{} further places are damaged", oWrong.size() - MOST_NAMED), DAMAGE_REMEDY});
+}
+
 // What is warned of while the file is read is a finding too.
 void CheckOpening(const std::string& file, const LoadedPlugin& oPlugin, std::vector<Finding>& oFindings)
 {
@@ -344,6 +363,7 @@ void CheckOpening(const std::string& file, const LoadedPlugin& oPlugin, std::vec
             oFindings.push_back({false, subject, "recognises the file and opens nothing", "report the plug-in"});
         else if (CheckLinks(*poDataset, subject, oFindings))
         {
+            CompareChecksums(*poDataset, subject, oFindings);
             oFindings.push_back({true, subject, "recognises the file; " + DescribeOpened(*poDataset), {}});
             TryParts(*poDataset, subject, oFindings);
         }
