@@ -1,17 +1,20 @@
 // Measures reading a stack of images of different types as one type against reading the groups of one type by
-// themselves, tile by tile: through readers of the files, and from a DEMO file that the stack is written to.
+// themselves, tile by tile: through readers of the files, and from a DEMO file that the stack is written to. And
+// writing rasters of one type into channels of three types in memory against memcpy of the rasters.
 //     krv_bench_mixed FOLDER [FILE...]
 // The files are images of one size, made ones by default; FOLDER takes them and the stack.
 
 #include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
 #include "benchmarks/support/scene.h"
+#include "datasources/datasets/memorydataset.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/multitypereader.h"
+#include "datasources/writer/multitypewriter.h"
 #include "gobs/raster/raster.h"
 
 #include <algorithm>
@@ -161,6 +164,51 @@ void MeasureFiles(IDataset& oDataset, const std::vector<Layer>& oLayers, const D
     Measure("the files", oMixed, oGroups);
 }
 
+// The tiles of an image are written over and over: none is new memory. One raster takes the place of all, as a program
+// has that fills one and writes it.
+void MeasureWriting(const std::string& name, const std::vector<DataType>& oTypes, unsigned int nTile)
+{
+    constexpr unsigned int SIZE = 2048;
+    MemoryDataset oDataset;
+    oDataset.Create(SIZE, SIZE, oTypes);
+    MultiTypeWriter oWriter(static_cast<IRasterDataset*>(&oDataset), {});
+    Raster oRaster({nTile, nTile, oWriter.GetChansCount(), oWriter.GetDataType()}, {0, 0});
+    std::memset(oRaster.GetBuffer(), 0, oRaster.GetBufferSize());
+    std::vector<unsigned char> oCopy(std::uint64_t{SIZE} / nTile * SIZE / nTile * oRaster.GetBufferSize(), 1);
+    const auto oEachTile = [&](const auto& oWrite)
+    {
+        for (unsigned int n = 0; n < SIZE / nTile * (SIZE / nTile); ++n)
+            oWrite(n);
+    };
+    const auto oTimes = MedianSeconds({{"memcpy",
+                                        [&]
+                                        {
+                                            oEachTile(
+                                                [&](unsigned int n)
+                                                {
+                                                    std::memcpy(oCopy.data() + n * oRaster.GetBufferSize(),
+                                                                oRaster.GetBuffer(), oRaster.GetBufferSize());
+                                                    Keep(oCopy.data());
+                                                });
+                                        }},
+                                       {"mixed",
+                                        [&]
+                                        {
+                                            oEachTile(
+                                                [&](unsigned int n)
+                                                {
+                                                    const Raster oTile(oRaster.GetInfo(),
+                                                                       {static_cast<int>(n % (SIZE / nTile) * nTile),
+                                                                        static_cast<int>(n / (SIZE / nTile) * nTile)},
+                                                                       oRaster.GetBuffer(), false);
+                                                    oWriter.WriteRaster(&oTile);
+                                                });
+                                        }}},
+                                      ROUNDS);
+    PrintRow(name + ", tiles of " + std::to_string(nTile), oTimes[0] / oTimes[1], 0.75,
+             Number(static_cast<double>(oCopy.size()) / oTimes[1] / 1e9) + " GB/s of rasters");
+}
+
 } // namespace
 
 int main(int nArguments, char** pArguments)
@@ -184,6 +232,15 @@ int main(int nArguments, char** pArguments)
     {
         MeasureStack(stack, oLayers, oType);
         MeasureFiles(*oDataset, oLayers, oType);
+    }
+    PrintHeading("Writing into three types against memcpy of the rasters");
+    for (const unsigned int nTile : {256U, 1024U})
+    {
+        MeasureWriting("8U, 16U, 32R", {krv::gobs::eDT_8U, krv::gobs::eDT_16U, krv::gobs::eDT_32R}, nTile);
+        MeasureWriting("3 x 8U, 2 x 16S, 64R",
+                       {krv::gobs::eDT_8U, krv::gobs::eDT_16S, krv::gobs::eDT_8U, krv::gobs::eDT_64R,
+                        krv::gobs::eDT_16S, krv::gobs::eDT_8U},
+                       nTile);
     }
     return 0;
 }

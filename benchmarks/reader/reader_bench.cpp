@@ -14,6 +14,7 @@
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/reader/basicreader.h"
 #include "gobs/raster/raster.h"
+#include "toolkit/cache/tilestore.h"
 
 #include <fcntl.h>
 #include <spawn.h>
@@ -23,11 +24,13 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <atomic>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
+#include <functional>
 #include <memory>
 #include <random>
 #include <thread>
@@ -299,6 +302,16 @@ void MeasureEightRasters()
     }
 }
 
+void RunThreads(unsigned int nThreads, const std::function<void(unsigned int)>& oRun)
+{
+    std::vector<std::thread> oThreads;
+    for (unsigned int n = 1; n < nThreads; ++n)
+        oThreads.emplace_back(oRun, n);
+    oRun(0);
+    for (std::thread& oThread : oThreads)
+        oThread.join();
+}
+
 // The same by hand says what the machine has for so many threads at all.
 void MeasureThreads(const SceneFile& oScene, unsigned int nThreads)
 {
@@ -310,41 +323,127 @@ void MeasureThreads(const SceneFile& oScene, unsigned int nThreads)
         oReaders.push_back(OpenScene(oScene));
         oHands.push_back(std::make_unique<ByHand>(oScene));
     }
-    const auto InThreads = [nThreads](const auto& oRun)
-    {
-        std::vector<std::thread> oThreads;
-        for (unsigned int n = 1; n < nThreads; ++n)
-            oThreads.emplace_back(oRun, n);
-        oRun(0);
-        for (std::thread& oThread : oThreads)
-            oThread.join();
-    };
-    const auto oTimes = MedianSeconds({{"one",
-                                        [&]
-                                        {
-                                            ReadTiles(*oReaders[0], 0, nTiles);
-                                        }},
-                                       {"threads",
-                                        [&]
-                                        {
-                                            InThreads([&](unsigned int n) { ReadTiles(*oReaders[n], 0, nTiles); });
-                                        }},
-                                       {"one by hand",
-                                        [&]
-                                        {
-                                            ReadTilesOf(*oHands[0], nTiles);
-                                        }},
-                                       {"threads by hand",
-                                        [&]
-                                        {
-                                            InThreads([&](unsigned int n) { ReadTilesOf(*oHands[n], nTiles); });
-                                        }}},
-                                      5);
+    const auto oTimes =
+        MedianSeconds({{"one",
+                        [&]
+                        {
+                            ReadTiles(*oReaders[0], 0, nTiles);
+                        }},
+                       {"threads",
+                        [&]
+                        {
+                            RunThreads(nThreads, [&](unsigned int n) { ReadTiles(*oReaders[n], 0, nTiles); });
+                        }},
+                       {"one by hand",
+                        [&]
+                        {
+                            ReadTilesOf(*oHands[0], nTiles);
+                        }},
+                       {"threads by hand",
+                        [&]
+                        {
+                            RunThreads(nThreads, [&](unsigned int n) { ReadTilesOf(*oHands[n], nTiles); });
+                        }}},
+                      5);
     PrintRow(oScene.moKind.moName + " " + oScene.moCodec + ", " + std::to_string(nThreads) +
                  " threads with a reader each",
              nThreads * oTimes[0] / oTimes[1], nThreads == 2 ? 1.8 : 0,
              "by hand " + Number(nThreads * oTimes[2] / oTimes[3]) + "; against as many by hand " +
                  Number(oTimes[3] / oTimes[1]));
+}
+
+using Readers = std::vector<std::unique_ptr<BasicReader>>;
+
+Readers OpenWithMargins(const SceneFile& oScene, std::size_t nReaders)
+{
+    Readers oReaders;
+    for (std::size_t n = 0; n < nReaders; ++n)
+    {
+        oReaders.push_back(OpenScene(oScene));
+        oReaders.back()->SetMargins(8, 8, eMirror);
+    }
+    return oReaders;
+}
+
+// Readers of one file that share its tiles between them, each with margins.
+void MeasureSharing(const SceneFile& oScene)
+{
+    const unsigned int nTiles = TilesOfPass(oScene);
+    krv::cache::TileStore& oStore = krv::cache::TileStore::Process();
+    const std::string name = oScene.moKind.moName + " " + oScene.moCodec + ", ";
+    for (const std::size_t nReaders : {2u, 4u})
+    {
+        const Readers oReaders = OpenWithMargins(oScene, nReaders);
+        oStore.ResetStatistics();
+        for (unsigned int nTile = 0; nTile < nTiles; ++nTile)
+            ReadTiles(*oReaders[nTile % nReaders], nTile, nTile + 1);
+        // The pass shows the row of tiles below it too.
+        const unsigned int nShown = std::min(nTiles + oScene.TilesAcross(), oScene.TilesAcross() * oScene.TilesDown());
+        PrintRow(name + std::to_string(nReaders) + " readers take tiles in turn, decodes per tile",
+                 static_cast<double>(oStore.GetStatistics().mnMisses) / nShown, 0, "goal 1.00");
+    }
+    const auto InTurn = [&](unsigned int nThreads)
+    {
+        const Readers oReaders = OpenWithMargins(oScene, nThreads);
+        std::atomic<unsigned int> nNext{0};
+        RunThreads(nThreads,
+                   [&](unsigned int nThread)
+                   {
+                       for (unsigned int nTile = nNext++; nTile < nTiles; nTile = nNext++)
+                           ReadTiles(*oReaders[nThread], nTile, nTile + 1);
+                   });
+    };
+    const auto oTimes = MedianSeconds({{"one",
+                                        [&]
+                                        {
+                                            InTurn(1);
+                                        }},
+                                       {"two",
+                                        [&]
+                                        {
+                                            InTurn(2);
+                                        }}},
+                                      5);
+    PrintRow(name + "two threads take tiles as they come", oTimes[0] / oTimes[1], 1.8);
+}
+
+double ProcessorSeconds()
+{
+    timespec oTime = {};
+    clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &oTime);
+    return static_cast<double>(oTime.tv_sec) + static_cast<double>(oTime.tv_nsec) * 1e-9;
+}
+
+// Small windows of blocks that are all there: processor time for each by one thread and by eight.
+void MeasureHits(const SceneFile& oScene)
+{
+    constexpr unsigned int HITS = 40000;
+    constexpr unsigned int SIDE = 32;
+    const auto PerHit = [&](unsigned int nThreads)
+    {
+        const Readers oReaders = OpenWithMargins(oScene, nThreads);
+        ReadWindows(*oReaders[0], {{10, 10}, {300, 10}, {10, 300}, {300, 300}});
+        const double nBegin = ProcessorSeconds();
+        RunThreads(nThreads,
+                   [&](unsigned int nThread)
+                   {
+                       for (unsigned int n = 0; n < HITS / nThreads; ++n)
+                       {
+                           const std::unique_ptr<Raster> oRaster(
+                               oReaders[nThread]->ReadRaster(20 + n % 200, 20 + n / 200 % 200, SIDE, SIDE));
+                           Keep(oRaster->GetBuffer());
+                       }
+                   });
+        return (ProcessorSeconds() - nBegin) / HITS;
+    };
+    std::vector<double> oOne, oEight;
+    for (int nRound = 0; nRound < 5; ++nRound)
+    {
+        oOne.push_back(PerHit(1));
+        oEight.push_back(PerHit(8));
+    }
+    PrintRow(oScene.moKind.moName + " " + oScene.moCodec + ", hits by eight threads, processor time of one thread's",
+             Median(oEight) / Median(oOne), 0, "at most 1.3; " + Number(Median(oOne) * 1e9, 0) + " ns");
 }
 
 // Eight images open at once, a tile of each in turn, against the same tiles one image after the other.
@@ -425,6 +524,36 @@ double RunChild(const Settings& oSettings, const char* pWhat)
     return static_cast<double>(nPeak) / 1024;
 }
 
+constexpr std::uint64_t WIDE_BUDGET = std::uint64_t{256} << 20;
+
+std::vector<SceneFile> MakeWideImages(const std::string& folder)
+{
+    std::vector<SceneFile> oScenes(8, MakeScene(folder, KINDS[0], "zstd", 256, WIDE, 1024));
+    for (std::size_t n = 1; n < oScenes.size(); ++n)
+    {
+        oScenes[n].moPath += "." + std::to_string(n) + ".tif";
+        std::filesystem::copy_file(oScenes[0].moPath, oScenes[n].moPath, std::filesystem::copy_options::skip_existing);
+    }
+    return oScenes;
+}
+
+// A tile of each of eight wide images in turn, with margins.
+void ReadWideImages(const std::string& folder)
+{
+    const std::vector<SceneFile> oScenes = MakeWideImages(folder);
+    krv::cache::TileStore& oStore = krv::cache::TileStore::Process();
+    oStore.SetBudget(WIDE_BUDGET);
+    Readers oReaders;
+    for (const SceneFile& oScene : oScenes)
+        oReaders.push_back(std::move(OpenWithMargins(oScene, 1).front()));
+    const unsigned int nTiles = oScenes[0].TilesAcross() * oScenes[0].TilesDown();
+    for (unsigned int nTile = 0; nTile < nTiles; ++nTile)
+        for (const auto& poReader : oReaders)
+            ReadTiles(*poReader, nTile, nTile + 1);
+    std::fprintf(stderr, "eight readers of wide images: %.2f decodes per tile\n",
+                 static_cast<double>(oStore.GetStatistics().mnMisses) / nTiles / 8);
+}
+
 int BeChild(const std::string& what, const std::string& folder)
 {
     if (what != "nothing")
@@ -435,6 +564,8 @@ int BeChild(const std::string& what, const std::string& folder)
         oReader.SetMargins(8, 8, eMirror);
         ReadTiles(oReader, 0, oReader.GetTileCount());
     }
+    if (what == "wide")
+        ReadWideImages(folder);
     long nPeak = 0;
     std::ifstream oStatus("/proc/self/status");
     for (std::string line; std::getline(oStatus, line);)
@@ -461,6 +592,9 @@ void MeasureProcess(const Settings& oSettings)
     const double nInstance = RunChild(oSettings, "instance");
     PrintRow("sparse 100000 x 100000 with margins, MiB above", RunChild(oSettings, "sparse") - nInstance, 0,
              "at most the cache's bound + 32; the process alone " + Number(nInstance, 1));
+    MakeWideImages(oSettings.moFolder);
+    PrintRow("eight readers of wide images in turn, budget 256 MiB, MiB above", RunChild(oSettings, "wide") - nInstance,
+             0, "at most 320");
 }
 
 void MeasureOpening(const SceneFile& oScene)
@@ -557,6 +691,10 @@ void MeasureAll(const Settings& oSettings, const Arguments& oArguments)
                 for (const unsigned int nThreads : {2u, 8u})
                     MeasureThreads(oMake(oKind, codec, 256), nThreads);
                 MeasureEightReaders(oMake(oKind, codec, 256));
+                if (codec != "none")
+                    MeasureSharing(oMake(oKind, codec, 256));
+                if (codec == "deflate")
+                    MeasureHits(oMake(oKind, codec, 256));
             }
     }
     if (oArguments.Wants("process"))

@@ -15,6 +15,7 @@
 
 #include <algorithm>
 #include <limits>
+#include <map>
 #include <optional>
 #include <string_view>
 #include <utility>
@@ -57,6 +58,11 @@ DataType FindComplexType(const DataType& oType, eComplexForm eForm)
     }
 }
 
+std::size_t ValueBytes(const DataType& oType)
+{
+    return static_cast<std::size_t>(oType.GetValueBits() / 8);
+}
+
 bool EndsInSuffix(const std::string& key)
 {
     return key.ends_with(MetaComplexDataset::SECOND_SUFFIX);
@@ -79,6 +85,22 @@ MetadataMap ShownTags(const AuxiliaryData& oRecord, unsigned int nChannel)
     DropStatistics(oTags);
     oTags.erase(NO_DATA_KEY);
     return oTags;
+}
+
+// The book of levels of a pair: a level is as both channels say, where they agree, and valid without a method when both
+// have it so.
+void JoinBooks(AuxiliaryData oFirst, unsigned int nFirst, AuxiliaryData oSecond, unsigned int nSecond,
+               MetadataMap& oTags)
+{
+    const MetadataMap oOther = oSecond.GetChanOverviewMetadata(nSecond);
+    for (const auto& [key, state] : oFirst.GetChanOverviewMetadata(nFirst))
+    {
+        const auto oFound = oOther.find(key);
+        if (oFound == oOther.end())
+            continue;
+        const bool bValid = state.starts_with("valid") && oFound->second.starts_with("valid");
+        oTags[key] = state == oFound->second ? state : bValid ? "valid" : "invalid";
+    }
 }
 
 // The other way: tags in the place of those that were shown.
@@ -117,10 +139,12 @@ struct MetaComplexDataset::State
 
     std::optional<detail::PairNoData> FindNoData(const AuxiliaryData& oFirst, const AuxiliaryData& oSecond,
                                                  std::size_t nPair) const;
-    // The I/O of the sources for pairs, of the image or of levels, made by oOpen(second, channels).
+    // The I/O of pairs of channels of one type over those of the sources, made by oOpen(second, channels).
     template <typename Open>
-    std::pair<std::unique_ptr<IRasterIO>, std::unique_ptr<IRasterIO>>
-    OpenSources(const std::vector<unsigned int>& oChannels, const Open& oOpen) const;
+    std::unique_ptr<IRasterIO> OpenPairs(const std::vector<unsigned int>& oChannels, const Open& oOpen) const;
+    // The same for any pairs of one complex type: those of one type each are read together.
+    template <typename Part, typename Open>
+    std::vector<Part> OpenParts(const std::vector<unsigned int>& oChannels, const Open& oOpen) const;
     detail::PairForm MakeForm(const std::vector<unsigned int>& oChannels) const;
 };
 
@@ -144,8 +168,8 @@ std::optional<detail::PairNoData> MetaComplexDataset::State::FindNoData(const Au
 }
 
 template <typename Open>
-std::pair<std::unique_ptr<IRasterIO>, std::unique_ptr<IRasterIO>>
-MetaComplexDataset::State::OpenSources(const std::vector<unsigned int>& oChannels, const Open& oOpen) const
+std::unique_ptr<IRasterIO> MetaComplexDataset::State::OpenPairs(const std::vector<unsigned int>& oChannels,
+                                                                const Open& oOpen) const
 {
     std::vector<unsigned int> oFirst, oSecond;
     for (const unsigned int nChannel : oChannels)
@@ -157,7 +181,24 @@ MetaComplexDataset::State::OpenSources(const std::vector<unsigned int>& oChannel
     std::unique_ptr<IRasterIO> poSecond(mpoSecond != nullptr ? oOpen(true, oSecond) : nullptr);
     if (poFirst == nullptr || (mpoSecond != nullptr && poSecond == nullptr))
         throw krv::DataException("A source of complex pairs gave no raster I/O");
-    return {std::move(poFirst), std::move(poSecond)};
+    return std::make_unique<detail::PairIO>(std::move(poFirst), std::move(poSecond), MakeForm(oChannels));
+}
+
+template <typename Part, typename Open>
+std::vector<Part> MetaComplexDataset::State::OpenParts(const std::vector<unsigned int>& oChannels,
+                                                       const Open& oOpen) const
+{
+    std::map<DataType, std::pair<std::vector<unsigned int>, std::vector<std::size_t>>> oByType;
+    for (std::size_t n = 0; n < oChannels.size(); ++n)
+    {
+        auto& [oNumbers, oPositions] = oByType[moSourceTypes[oChannels[n] - 1]];
+        oNumbers.push_back(oChannels[n]);
+        oPositions.push_back(n);
+    }
+    std::vector<Part> oParts;
+    for (const auto& [oType, oMembers] : oByType)
+        oParts.push_back({OpenPairs(oMembers.first, oOpen), oMembers.second});
+    return oParts;
 }
 
 detail::PairForm MetaComplexDataset::State::MakeForm(const std::vector<unsigned int>& oChannels) const
@@ -204,10 +245,12 @@ public:
         CheckLevel(nLevel);
         static_cast<void>(
             detail::CheckChannelList(oChannels, moState.moTypes, moDataset.moDescription, Place::Current()));
-        auto [poFirst, poSecond] =
-            moState.OpenSources(oChannels, [&](bool bSecond, const std::vector<unsigned int>& oList)
-                                { return (bSecond ? mpoSecond : mpoFirst)->GetOverviewIO(nLevel, oList); });
-        return new detail::PairLevelIO(nLevel, std::move(poFirst), std::move(poSecond), moState.MakeForm(oChannels));
+        const auto Open = [&](bool bSecond, const std::vector<unsigned int>& oList)
+        {
+            return (bSecond ? mpoSecond : mpoFirst)->GetOverviewIO(nLevel, oList);
+        };
+        return new detail::PairLevelIO(nLevel, moState.OpenParts<detail::PairLevelIO::Part>(oChannels, Open),
+                                       ValueBytes(moState.moTypes[oChannels.front() - 1]));
     }
     void CreateLevel(unsigned int nLevel) override
     {
@@ -421,6 +464,7 @@ AuxiliaryData MetaComplexDataset::JoinRecords(const AuxiliaryData& oFirst, const
             oTags[WithSuffix(key)] = value;
         if (const auto oNoData = mpoState->FindNoData(oFirst, oSecond, nPair))
             oTags[NO_DATA_KEY] = oNoData->moComplex.GetText();
+        JoinBooks(oFirst, oPair.mnFirst, oSecond, oPair.mnSecond, oTags);
         const std::string description = oFirst.GetChannelDescription(oPair.mnFirst);
         const std::string other = oSecond.GetChannelDescription(oPair.mnSecond);
         if (!other.empty() && other != description)
@@ -470,7 +514,8 @@ void MetaComplexDataset::WriteAuxiliaryData(const AuxiliaryData& oData)
         const ComplexPair& oPair = mpoState->moPairs[nPair];
         const auto nChannel = static_cast<unsigned int>(nPair) + 1;
         MetadataMap oFirstMap, oSecondMap;
-        for (const auto& [key, value] : oData.GetChanMetadata(nChannel))
+        const AuxiliaryData oTold = oData.GetCleanedMeta(); // the book of levels is their manager's
+        for (const auto& [key, value] : oTold.GetChanMetadata(nChannel))
         {
             if (key == NO_DATA_KEY || key == DESCRIPTION_KEY)
                 continue;
@@ -529,15 +574,14 @@ IRasterIO* MetaComplexDataset::GetRasterIO(const std::vector<unsigned int>& oCha
     const Place oPlace = Place::Current();
     CheckOpen(oPlace);
     static_cast<void>(detail::CheckChannelList(oChannels, mpoState->moTypes, moDescription, oPlace));
-    for (const unsigned int nChannel : oChannels)
-        if (mpoState->moSourceTypes[nChannel - 1] != mpoState->moSourceTypes[oChannels.front() - 1])
-            Refuse("channels " + std::to_string(oChannels.front()) + " and " + std::to_string(nChannel) +
-                       " are pairs of different types",
-                   oPlace);
-    auto [poFirst, poSecond] = mpoState->OpenSources(
-        oChannels, [&](bool bSecond, const std::vector<unsigned int>& oList)
-        { return (bSecond ? mpoState->mpoSecondRasters : mpoState->mpoFirstRasters)->GetRasterIO(oList); });
-    return new detail::PairIO<IRasterIO>(std::move(poFirst), std::move(poSecond), mpoState->MakeForm(oChannels));
+    const auto Open = [&](bool bSecond, const std::vector<unsigned int>& oList)
+    {
+        return (bSecond ? mpoState->mpoSecondRasters : mpoState->mpoFirstRasters)->GetRasterIO(oList);
+    };
+    auto oParts = mpoState->OpenParts<detail::StackedIO<IRasterIO>::Part>(oChannels, Open);
+    if (oParts.size() == 1)
+        return oParts.front().mpoIO.release();
+    return new detail::StackedIO<IRasterIO>(std::move(oParts), ValueBytes(mpoState->moTypes[oChannels.front() - 1]));
 }
 
 unsigned int MetaComplexDataset::GetWidth() const

@@ -19,6 +19,11 @@ krv::datasources::IDataset* Jp2Builder::Open(const std::string& fileName, Access
     return new Jp2Dataset(fileName, GetFileFormat());
 }
 
+krv::datasources::IDataset* Jp2Builder::Create(const std::string& fileName, const std::string& options)
+{
+    return new Jp2Dataset(GetFileFormat(), std::make_shared<Jp2Writer>(fileName, CreateOptions::Parse(options)));
+}
+
 int Jp2Builder::Identify(const std::string&, const unsigned char* pHeader, unsigned int nHeaderLength, int)
 {
     return IsBoxed(pHeader, nHeaderLength) || IsCodestream(pHeader, nHeaderLength) ? 0 : 1;

@@ -14,6 +14,8 @@ public:
     ~Jp2Builder() override;
 
     krv::datasources::IDataset* Open(const std::string& fileName, AccessMode eMode) override;
+    // options: see CreateOptions. The file comes into being when the dataset is synchronised.
+    krv::datasources::IDataset* Create(const std::string& fileName, const std::string& options) override;
     int Identify(const std::string& fileName, const unsigned char* pHeader, unsigned int nHeaderLength,
                  int nReserved) override;
 };

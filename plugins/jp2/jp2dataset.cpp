@@ -2,6 +2,7 @@
 
 #include "datasources/interfaces/channelinfo.h"
 #include "plugins/jp2/reading/jp2source.h"
+#include "plugins/jp2/recordbox.h"
 #include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
@@ -15,7 +16,7 @@ namespace krv::plugins::jp2
 namespace
 {
 
-constexpr unsigned int MOST_REDUCED = 24;
+constexpr unsigned int MOST_REDUCED = 24; // level numbers are powers of two
 // Levels down to where the larger side is below it.
 constexpr std::uint32_t SMALLEST_LEVEL = 1;
 
@@ -29,7 +30,24 @@ Jp2Dataset::Jp2Dataset(const std::string& fileName, krv::datasources::IFileForma
     SetImage(std::make_shared<Jp2Source>(mpoStream, 0));
 }
 
-Jp2Dataset::~Jp2Dataset() = default;
+Jp2Dataset::Jp2Dataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<Jp2Writer> poWriter)
+    : Dataset(poFormat, poWriter), mpoWriter(std::move(poWriter))
+{
+}
+
+Jp2Dataset::~Jp2Dataset()
+{
+    Abandon();
+}
+
+void Jp2Dataset::Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes)
+{
+    const Place oPlace = Place::Current();
+    CheckCreate(nWidth, nHeight, oTypes, oPlace);
+    mpoWriter->Make(nWidth, nHeight, oTypes, oPlace);
+    moBook = krv::datasources::AuxiliaryData(static_cast<unsigned int>(oTypes.size()));
+    SetImage(mpoWriter->GetTiles());
+}
 
 void Jp2Dataset::FindCodestream(const std::shared_ptr<support::File>& poFile)
 {
@@ -65,7 +83,8 @@ void Jp2Dataset::Complain(const std::string& trouble) const
 {
     if (trouble.empty() || !moComplaints.insert(trouble).second)
         return;
-    krv::nspio::Warning::Warn(GetFileName() + ": " + trouble);
+    const bool bNamed = trouble.starts_with(GetFileName());
+    krv::nspio::Warning::Warn(bNamed ? trouble : GetFileName() + ": " + trouble);
 }
 
 void Jp2Dataset::Close()
@@ -76,6 +95,8 @@ void Jp2Dataset::Close()
 
 krv::datasources::IChannelInfo* Jp2Dataset::GetChannelInfo(unsigned int nChannel) const
 {
+    if (mpoWriter)
+        return Dataset::GetChannelInfo(nChannel);
     const support::Plane& oPlane = GetLayout().GetChannelPlane(nChannel);
     const Component& oComponent = mpoStream->GetComponents()[nChannel - 1];
     return new krv::datasources::ChannelInfo(
@@ -84,10 +105,22 @@ krv::datasources::IChannelInfo* Jp2Dataset::GetChannelInfo(unsigned int nChannel
 
 krv::datasources::AuxiliaryData Jp2Dataset::ReadAuxiliaryData()
 {
-    using Use = ImageHeader::Use;
-    CheckOpen();
-    const std::vector<Component>& oComponents = mpoStream->GetComponents();
-    krv::datasources::AuxiliaryData oData(static_cast<unsigned int>(oComponents.size()));
+    GetImage();
+    return mpoWriter ? mpoWriter->GetRecord() : ReadRecord();
+}
+
+void Jp2Dataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData)
+{
+    CheckWriting("metadata cannot be written", Place::Current());
+    if (oData.GetChannelCount() != GetChanCount())
+        Refuse("the metadata are those of " + std::to_string(oData.GetChannelCount()) + " channels, not of " +
+               std::to_string(GetChanCount()));
+    mpoWriter->SetRecord(oData);
+}
+
+krv::datasources::AuxiliaryData Jp2Dataset::ReadRecord() const
+{
+    krv::datasources::AuxiliaryData oData(static_cast<unsigned int>(mpoStream->GetComponents().size()));
     const auto SetText = [&oData](const char* pKey, const std::string& text)
     {
         if (!text.empty())
@@ -96,6 +129,8 @@ krv::datasources::AuxiliaryData Jp2Dataset::ReadAuxiliaryData()
     SetText("ColorSpace", moHeader.GetColourSpace());
     SetText("ICCProfile", moHeader.moProfile);
     SetText("Comment", mpoStream->GetComment());
+    if (const auto oBytes = FindUuid(*mpoStream->GetFile(), moBoxes, XMP_UUID))
+        SetText("XMP", std::string(oBytes->begin(), std::find(oBytes->begin(), oBytes->end(), 0)));
     if (moHeader.moResolution)
     {
         constexpr double CENTIMETRES = 100.0;
@@ -103,32 +138,93 @@ krv::datasources::AuxiliaryData Jp2Dataset::ReadAuxiliaryData()
         SetText("YResolution", NumberText(moHeader.moResolution->second / CENTIMETRES));
         SetText("ResolutionUnit", "centimetre");
     }
+    DescribeChannels(oData);
+    if (const auto oBytes = FindUuid(*mpoStream->GetFile(), moBoxes, RECORD_UUID))
+        ReadRecordBox(std::string(oBytes->begin(), oBytes->end()), oData);
+    return oData;
+}
 
+void Jp2Dataset::DescribeChannels(krv::datasources::AuxiliaryData& oData) const
+{
+    using Use = ImageHeader::Use;
     static constexpr const char* COLOURS[] = {"Red", "Green", "Blue"};
     constexpr unsigned int SRGB = 16;
-    const bool bRed = moHeader.mnColours == SRGB && oComponents.size() >= 3;
-    for (unsigned int nAt = 0; nAt < oComponents.size(); ++nAt)
+    const unsigned int nChannels = oData.GetChannelCount();
+    const bool bColours = moHeader.mnColours == SRGB && nChannels >= 3;
+    const bool bGrey = !bColours && nChannels <= 2;
+    for (unsigned int nAt = 0; nAt < nChannels; ++nAt)
     {
         const auto oTold = moHeader.moChannels.find(nAt);
+        const ImageHeader::Channel oChannel = oTold != moHeader.moChannels.end() ? oTold->second
+                                              : moHeader.moChannels.empty()
+                                                  ? ImageHeader::Channel{Use::eColour, nAt + 1}
+                                                  : ImageHeader::Channel{Use::eOther, 0};
         std::string interpretation;
         if (moHeader.moPalette)
             interpretation = nAt == moHeader.mnPaletteComponent ? "Palette" : "";
-        else if (oTold == moHeader.moChannels.end())
-            interpretation = bRed && nAt < 3 && moHeader.moChannels.empty() ? COLOURS[nAt]
-                             : nAt == 0 && oComponents.size() <= 2 && !bRed ? "Gray"
-                                                                            : "";
-        else if (oTold->second.meUse == Use::eAlpha || oTold->second.meUse == Use::ePremultiplied)
+        else if (oChannel.meUse == Use::eAlpha || oChannel.meUse == Use::ePremultiplied)
         {
             interpretation = "Alpha";
-            oData.SetChanMetadataValue("AlphaKind", oTold->second.meUse == Use::eAlpha ? "Straight" : "Premultiplied",
+            oData.SetChanMetadataValue("AlphaKind", oChannel.meUse == Use::eAlpha ? "Straight" : "Premultiplied",
                                        nAt + 1);
         }
-        else if (oTold->second.meUse == Use::eColour && oTold->second.mnColour >= 1 && oTold->second.mnColour <= 3)
-            interpretation = bRed ? COLOURS[oTold->second.mnColour - 1] : oComponents.size() <= 2 ? "Gray" : "";
+        else if (oChannel.meUse == Use::eColour && oChannel.mnColour >= 1 && oChannel.mnColour <= 3)
+            interpretation = bColours ? COLOURS[oChannel.mnColour - 1] : bGrey && oChannel.mnColour == 1 ? "Gray" : "";
         if (!interpretation.empty())
             oData.SetChanMetadataValue("ColorInterp", interpretation, nAt + 1);
     }
-    return oData;
+}
+
+const GeoPlace& Jp2Dataset::GetPlace() const
+{
+    CheckOpen();
+    if (!mpoPlace && mpoWriter)
+    {
+        mpoPlace = std::make_unique<GeoPlace>();
+        support::ReadGeocoding(mpoWriter->GetGeoTags(), mpoPlace->moGeocoding);
+        mpoPlace->mpoCRS = support::ReadCRS(mpoWriter->GetGeoTags(), GetFileName());
+    }
+    if (!mpoPlace)
+    {
+        std::vector<std::string> oTroubles;
+        mpoPlace = std::make_unique<GeoPlace>(ReadGeoPlace(*mpoStream->GetFile(), moBoxes, oTroubles));
+        for (const std::string& trouble : oTroubles)
+            Complain(trouble);
+    }
+    return *mpoPlace;
+}
+
+krv::ogc::cs::ICRS* Jp2Dataset::ReadCRS() const
+{
+    const GeoPlace& oPlace = GetPlace();
+    return oPlace.mpoCRS ? oPlace.mpoCRS->Clone() : nullptr;
+}
+
+const krv::ogc::cs::GeocodingInfo& Jp2Dataset::GetGeocoding() const
+{
+    return GetPlace().moGeocoding;
+}
+
+void Jp2Dataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
+{
+    const Place oPlace = Place::Current();
+    CheckWriting("the geocoding cannot be written", oPlace);
+    if (!oInfo.IsInvertible())
+        Refuse("a geocoding without an inverse cannot be written", oPlace);
+    support::GeoTags oTags = mpoWriter->GetGeoTags();
+    support::SetGeocoding(oTags, oInfo);
+    mpoWriter->SetGeoTags(std::move(oTags));
+    mpoPlace.reset();
+}
+
+void Jp2Dataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
+{
+    const Place oPlace = Place::Current();
+    CheckWriting("the reference system cannot be written", oPlace);
+    support::GeoTags oTags = mpoWriter->GetGeoTags();
+    support::SetCRS(oTags, oCRS, GetFileName(), oPlace);
+    mpoWriter->SetGeoTags(std::move(oTags));
+    mpoPlace.reset();
 }
 
 std::vector<support::LevelStore::Level> Jp2Dataset::GetLevels() const
@@ -179,14 +275,19 @@ void Jp2Dataset::WriteBook(const krv::datasources::AuxiliaryData&, bool, const P
 
 krv::datasources::IOverviewManager* Jp2Dataset::GetOverviewManager()
 {
-    CheckOpen();
-    return new support::OverviewManager(*this, *this);
+    GetImage();
+    return mpoWriter ? nullptr : new support::OverviewManager(*this, *this);
+}
+
+const std::optional<krv::gobs::PCT>& Jp2Dataset::GetPalette() const
+{
+    return mpoWriter ? mpoWriter->GetPalette() : moHeader.moPalette;
 }
 
 std::vector<unsigned int> Jp2Dataset::GetPCTList() const
 {
     CheckOpen();
-    return moHeader.moPalette ? std::vector<unsigned int>{1} : std::vector<unsigned int>{};
+    return GetPalette() ? std::vector<unsigned int>{1} : std::vector<unsigned int>{};
 }
 
 void Jp2Dataset::CheckPCT(unsigned int nPCT, const Place& oPlace) const
@@ -198,7 +299,7 @@ void Jp2Dataset::CheckPCT(unsigned int nPCT, const Place& oPlace) const
 krv::gobs::PCT* Jp2Dataset::GetPCT(unsigned int nPCT) const
 {
     CheckPCT(nPCT, Place::Current());
-    return new krv::gobs::PCT(*moHeader.moPalette);
+    return new krv::gobs::PCT(*GetPalette());
 }
 
 unsigned int Jp2Dataset::GetPCTChannel(unsigned int nPCT) const
@@ -213,29 +314,35 @@ std::string Jp2Dataset::GetPCTDescription(unsigned int nPCT) const
     return {};
 }
 
-void Jp2Dataset::RefusePCT(const Place& oPlace) const
+unsigned int Jp2Dataset::CreatePCT(const krv::gobs::PCT& oTable, unsigned int nChannel)
 {
-    Refuse("pseudocolour tables cannot be written", oPlace);
+    const Place oPlace = Place::Current();
+    CheckWriting("pseudocolour tables cannot be written", oPlace);
+    if (nChannel > 1 || !GetPCTList().empty())
+        Refuse("JPEG 2000 holds one pseudocolour table, for channel 1", oPlace);
+    mpoWriter->SetPalette(oTable, oPlace);
+    return 1;
 }
 
-unsigned int Jp2Dataset::CreatePCT(const krv::gobs::PCT&, unsigned int)
+void Jp2Dataset::UpdatePCT(unsigned int nPCT, const krv::gobs::PCT& oTable)
 {
-    RefusePCT(Place::Current());
-}
-
-void Jp2Dataset::UpdatePCT(unsigned int, const krv::gobs::PCT&)
-{
-    RefusePCT(Place::Current());
+    const Place oPlace = Place::Current();
+    CheckWriting("pseudocolour tables cannot be written", oPlace);
+    CheckPCT(nPCT, oPlace);
+    mpoWriter->SetPalette(oTable, oPlace);
 }
 
 void Jp2Dataset::SetPCTDescription(unsigned int, const std::string&)
 {
-    RefusePCT(Place::Current());
+    Refuse("JPEG 2000 has no place for the description of a pseudocolour table");
 }
 
-void Jp2Dataset::DeletePCT(unsigned int)
+void Jp2Dataset::DeletePCT(unsigned int nPCT)
 {
-    RefusePCT(Place::Current());
+    const Place oPlace = Place::Current();
+    CheckWriting("pseudocolour tables cannot be deleted", oPlace);
+    CheckPCT(nPCT, oPlace);
+    mpoWriter->SetPalette(std::nullopt, oPlace);
 }
 
 } // namespace krv::plugins::jp2

@@ -1,10 +1,13 @@
 #pragma once
 
+#include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/metadata/auxiliarydata.h"
+#include "plugins/jp2/geo/geoboxes.h"
 #include "plugins/jp2/reading/boxes.h"
 #include "plugins/jp2/reading/codestream.h"
 #include "plugins/jp2/reading/imageheader.h"
+#include "plugins/jp2/writing/jp2writer.h"
 #include "plugins/support/dataset.h"
 #include "plugins/support/overviewmanager.h"
 
@@ -19,18 +22,34 @@ namespace krv::plugins::jp2
 {
 
 // A JPEG 2000 image. Its resolutions are its levels, which are always valid; a palette is its pseudocolour table
-// (number 1).
-class Jp2Dataset : public support::Dataset, public krv::datasources::IPCTDataset, private support::LevelStore
+// (number 1). A new file has levels when it is opened again.
+class Jp2Dataset : public support::Dataset,
+                   public krv::datasources::IGeocodedDataset,
+                   public krv::datasources::IPCTDataset,
+                   private support::LevelStore
 {
 public:
     // Throws krv::FileException kinds that name file and cause; nothing stays open then.
     Jp2Dataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat);
+    // A new one, which Create makes.
+    Jp2Dataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<Jp2Writer> poWriter);
     ~Jp2Dataset() override;
 
+    // Throws DataException for types that differ or that JPEG 2000 does not hold.
+    void Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes) override;
+    using support::Dataset::Create;
     krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
+    void WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override;
+    void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;
     krv::datasources::IChannelInfo* GetChannelInfo(unsigned int nChannel) const override;
+    // Null for a new file.
     krv::datasources::IOverviewManager* GetOverviewManager() override;
     void Close() override;
+
+    krv::ogc::cs::ICRS* ReadCRS() const override;
+    // The identity when the file has no geocoding.
+    const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override;
+    void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) override;
 
     std::vector<unsigned int> GetPCTList() const override;
     krv::gobs::PCT* GetPCT(unsigned int nPCT) const override;
@@ -51,15 +70,20 @@ private:
     void WriteBook(const krv::datasources::AuxiliaryData& oBook, bool bValid, const Place& oPlace) override;
 
     void FindCodestream(const std::shared_ptr<support::File>& poFile);
+    const GeoPlace& GetPlace() const;
+    const std::optional<krv::gobs::PCT>& GetPalette() const;
     void CheckPCT(unsigned int nPCT, const Place& oPlace) const;
-    [[noreturn]] void RefusePCT(const Place& oPlace) const;
+    krv::datasources::AuxiliaryData ReadRecord() const;
+    void DescribeChannels(krv::datasources::AuxiliaryData& oData) const;
     void Complain(const std::string& trouble) const;
 
-    std::shared_ptr<Codestream> mpoStream;
-    std::vector<Box> moBoxes; // of the file
+    std::shared_ptr<Codestream> mpoStream; // null for a new file
+    std::shared_ptr<Jp2Writer> mpoWriter;  // null when the file is only read
+    std::vector<Box> moBoxes;              // of the file
     ImageHeader moHeader;
     std::map<unsigned int, std::shared_ptr<support::BlockImage>> moLevels; // that are open
     krv::datasources::AuxiliaryData moBook;                                // empty: no level is invalid
+    mutable std::unique_ptr<GeoPlace> mpoPlace;                            // looked for when it is asked for
     mutable std::set<std::string> moComplaints;
 };
 

@@ -20,9 +20,8 @@ public:
     std::vector<Level> GetLevels() const override
     {
         std::vector<Level> oLevels;
-        for (const unsigned int nLevel : moDataset.GetCatalogue().moBitmapLevels)
-            oLevels.push_back(
-                {nLevel, (moDataset.GetWidth() - 1) / nLevel + 1, (moDataset.GetHeight() - 1) / nLevel + 1});
+        for (const auto& [nLevel, oSize] : moDataset.GetCatalogue().moBitmapLevels)
+            oLevels.push_back({nLevel, oSize.mnWidth, oSize.mnHeight});
         return oLevels;
     }
 
@@ -52,9 +51,8 @@ public:
         Catalogue& oCatalogue = moDataset.mpoWriter->GetCatalogue();
         for (const unsigned int nBitmap : moDataset.ListSegments(Segment::BITMAP))
             oCatalogue.moSegments.at(nBitmap).mpoPlane->moTables[oLevel.mnNumber] =
-                oCatalogue.MakeTable(oLevel.mnNumber);
-        auto& oLevels = oCatalogue.moBitmapLevels;
-        oLevels.insert(std::upper_bound(oLevels.begin(), oLevels.end(), oLevel.mnNumber), oLevel.mnNumber);
+                oCatalogue.MakeTable({oLevel.mnWidth, oLevel.mnHeight});
+        oCatalogue.moBitmapLevels[oLevel.mnNumber] = {oLevel.mnWidth, oLevel.mnHeight};
         oCatalogue.Describe();
         Store(oBook);
     }
@@ -68,7 +66,7 @@ public:
             moDataset.mpoWriter->DropTable(*oPlane.moTables.at(nLevel));
             oPlane.moTables.erase(nLevel);
         }
-        std::erase(oCatalogue.moBitmapLevels, nLevel);
+        oCatalogue.moBitmapLevels.erase(nLevel);
         moDataset.moBitmaps.erase({0, nLevel});
         Store(oBook);
     }
@@ -83,7 +81,7 @@ public:
         krv::datasources::AuxiliaryData oBook = GetBook();
         const unsigned int nFound = FindChannel(nBitmap);
         bool bNews = false;
-        for (const unsigned int nLevel : moDataset.GetCatalogue().moBitmapLevels)
+        for (const auto& [nLevel, oSize] : moDataset.GetCatalogue().moBitmapLevels)
             if (IsLevelValid(oBook, nFound, nLevel))
             {
                 SetLevelValid(oBook, nFound, nLevel, false, {});
@@ -121,7 +119,10 @@ std::shared_ptr<support::BlockImage> KrvdskDataset::OpenBitmap(unsigned int nBit
         if (nBitmap != 0 && mpoBitmapLevels)
             mpoBitmapLevels->Forget(nBitmap);
     };
-    poImage = std::make_shared<support::BlockImage>(MakeSource(std::move(oPlanes), nLevel, BeforeWrite), GetCache());
+    const Catalogue& oCatalogue = GetCatalogue();
+    const ImageSize& oSize = nLevel == 1 ? oCatalogue.moSize : oCatalogue.moBitmapLevels.at(nLevel);
+    poImage =
+        std::make_shared<support::BlockImage>(MakeSource(std::move(oPlanes), nLevel, oSize, BeforeWrite), GetCache());
     return poImage;
 }
 
@@ -157,7 +158,7 @@ unsigned int KrvdskDataset::CreateBitmap()
     oSegment.moKind = Segment::BITMAP;
     oSegment.mpoPlane = oCatalogue.MakeBitmapPlane();
     krv::datasources::AuxiliaryData oBook(1);
-    for (const unsigned int nLevel : oCatalogue.moBitmapLevels)
+    for (const auto& [nLevel, oSize] : oCatalogue.moBitmapLevels)
         SetLevelValid(oBook, 1, nLevel, false, {});
     oSegment.moMetadata = oBook.GetChanMetadata(1);
     oSegment.moDescription = "Bitmap " + std::to_string(oCatalogue.mnNextSegment);
@@ -195,9 +196,10 @@ krv::datasources::MetadataMap KrvdskDataset::GetBitmapMetadata(unsigned int nBit
         return poTheirs->GetBitmapMetadata(nBitmap);
     krv::datasources::AuxiliaryData oBook(1);
     oBook.SetChanMetadata(GetSegment(Segment::BITMAP, nBitmap, Place::Current()).moMetadata, 1);
-    for (const unsigned int nLevel : GetCatalogue().moBitmapLevels)
-        RemoveLevel(oBook, nLevel);
-    return oBook.GetChanMetadata(1);
+    krv::datasources::MetadataMap oMap = oBook.GetChanMetadata(1);
+    for (const auto& [key, value] : oBook.GetChanOverviewMetadata(1))
+        oMap.erase(key);
+    return oMap;
 }
 
 void KrvdskDataset::SetBitmapMetadata(unsigned int nBitmap, const krv::datasources::MetadataMap& oMetadata)
@@ -206,7 +208,7 @@ void KrvdskDataset::SetBitmapMetadata(unsigned int nBitmap, const krv::datasourc
     krv::datasources::AuxiliaryData oOld(1), oNew(1);
     oOld.SetChanMetadata(oSegment.moMetadata, 1);
     oNew.SetChanMetadata(oMetadata, 1);
-    for (const unsigned int nLevel : GetCatalogue().moBitmapLevels)
+    for (const auto& [nLevel, oSize] : GetCatalogue().moBitmapLevels)
         CopyLevel(oOld, oNew, nLevel);
     oSegment.moMetadata = oNew.GetChanMetadata(1);
 }

@@ -57,7 +57,7 @@ void KrvdskDataset::ShowFile()
     support::RecordText oRecord;
     oRecord.moTags = std::move(oTags.moTags);
     moHistories = std::move(oTags.moHistories);
-    for (const unsigned int nLevel : oCatalogue.moLevels)
+    for (const auto& [nLevel, oSize] : oCatalogue.moLevels)
         oRecord.moLevels[nLevel] = nLevel;
     if (!oCatalogue.moCRS.empty())
         oRecord.SetDefinition(oCatalogue.moCRS);
@@ -74,11 +74,12 @@ void KrvdskDataset::ShowImage()
 }
 
 std::shared_ptr<support::IBlockSource> KrvdskDataset::MakeSource(std::vector<std::shared_ptr<Plane>> oPlanes,
-                                                                 unsigned int nLevel,
+                                                                 unsigned int nLevel, const ImageSize& oSize,
                                                                  std::function<void()> oBeforeWrite) const
 {
-    const auto poSource = std::make_shared<TileSource>(
-        GetCatalogue(), TileSource::Origin{mpoStore, mpoWriter, std::move(oPlanes), nLevel, std::move(oBeforeWrite)});
+    const auto poSource =
+        std::make_shared<TileSource>(GetCatalogue(), TileSource::Origin{mpoStore, mpoWriter, std::move(oPlanes), nLevel,
+                                                                        oSize, std::move(oBeforeWrite)});
     if (mpoWriter)
         mpoWriter->Register(poSource);
     return poSource;
@@ -92,8 +93,7 @@ void KrvdskDataset::Create(unsigned int nWidth, unsigned int nHeight, const std:
     const Catalogue oDefaults = oCatalogue;
     try
     {
-        oCatalogue.mnWidth = nWidth;
-        oCatalogue.mnHeight = nHeight;
+        oCatalogue.moSize = {nWidth, nHeight};
         if (oCatalogue.moLinkPath.empty())
             AddPlanes(oCatalogue, oTypes, oPlace);
         else
@@ -121,8 +121,8 @@ void KrvdskDataset::AddPlanes(Catalogue& oCatalogue, const std::vector<krv::gobs
         oTypes[nFirst].GetNativeCode(oPlace);
         if (oTypes[nFirst].GetBits() < 8)
             Refuse("channels of single bits cannot be laid out; bitmaps can", oPlace);
-        const std::uint64_t nTile = std::uint64_t{std::min(oCatalogue.mnBlockWidth, oCatalogue.mnWidth)} *
-                                    std::min(oCatalogue.mnBlockHeight, oCatalogue.mnHeight) *
+        const std::uint64_t nTile = std::uint64_t{std::min(oCatalogue.mnBlockWidth, oCatalogue.moSize.mnWidth)} *
+                                    std::min(oCatalogue.mnBlockHeight, oCatalogue.moSize.mnHeight) *
                                     (oTypes[nFirst].GetValueBits() / 8);
         const std::size_t nMost = oCatalogue.mbSeparate ? 1 : std::max<std::uint64_t>(1, SENSIBLE_TILE / nTile);
         for (nEnd = nFirst + 1; nEnd < oTypes.size() && oTypes[nEnd] == oTypes[nFirst] && nEnd - nFirst < nMost;)
@@ -139,11 +139,19 @@ std::shared_ptr<support::IBlockSource> KrvdskDataset::MakeLevelSource(unsigned i
     {
         ForgetOldPixels();
     };
-    const auto poOwn = MakeSource(GetCatalogue().moPlanes, nLevel,
-                                  nLevel == 1 ? std::function<void()>(BeforeWrite) : std::function<void()>());
-    if (GetCatalogue().moLinked.empty())
+    const Catalogue& oCatalogue = GetCatalogue();
+    const auto poOwn = nLevel == 1
+                           ? MakeSource(oCatalogue.moPlanes, 1, oCatalogue.moSize, BeforeWrite)
+                           : MakeSource(oCatalogue.moPlanes, nLevel, oCatalogue.moLevels.at(nLevel), {});
+    if (oCatalogue.moLinked.empty())
         return poOwn;
-    return std::make_shared<LinkedSource>(mpoLink, GetCatalogue().moLinked, nLevel, poOwn);
+    return std::make_shared<LinkedSource>(mpoLink, oCatalogue.moLinked, nLevel, poOwn);
+}
+
+support::LevelStore::Level KrvdskDataset::DescribeLevel(unsigned int nLevel) const
+{
+    const ImageSize& oSize = GetCatalogue().moLevels.at(nLevel);
+    return {nLevel, oSize.mnWidth, oSize.mnHeight};
 }
 
 void KrvdskDataset::StoreRecord(const support::RecordText& oRecord) const
@@ -154,20 +162,21 @@ void KrvdskDataset::StoreRecord(const support::RecordText& oRecord) const
     oTags.moHistories = moHistories;
     Blob oBlob = oCatalogue.moRecord;
     oBlob.Set(oTags.Write());
-    std::vector<unsigned int> oLevels;
+    std::map<unsigned int, ImageSize> oLevels;
     for (const auto& [nLevel, nPlace] : oRecord.moLevels)
-        oLevels.push_back(nLevel);
-    for (const unsigned int nLevel : oCatalogue.moLevels)
-        if (!oRecord.moLevels.contains(nLevel))
+        oLevels[nLevel] =
+            oCatalogue.moLevels.contains(nLevel) ? oCatalogue.moLevels[nLevel] : oCatalogue.GetUsualSize(nLevel);
+    for (const auto& [nLevel, oSize] : oCatalogue.moLevels)
+        if (!oLevels.contains(nLevel))
             for (const std::shared_ptr<Plane>& poPlane : oCatalogue.moPlanes)
             {
                 mpoWriter->DropTable(*poPlane->moTables.at(nLevel));
                 poPlane->moTables.erase(nLevel);
             }
-    for (const unsigned int nLevel : oLevels)
+    for (const auto& [nLevel, oSize] : oLevels)
         for (const std::shared_ptr<Plane>& poPlane : oCatalogue.moPlanes)
             if (!poPlane->moTables.contains(nLevel))
-                poPlane->moTables[nLevel] = oCatalogue.MakeTable(nLevel);
+                poPlane->moTables[nLevel] = oCatalogue.MakeTable(oSize);
     oCatalogue.moLevels = std::move(oLevels);
     oCatalogue.moRecord = std::move(oBlob);
     oCatalogue.moCRS = oRecord.GetDefinition();
@@ -327,12 +336,12 @@ void KrvdskDataset::ForEachPiece(const std::function<void(const Entry& oEntry, c
     oAction(mpoStore->GetRoot().moDirectory, "the directory");
     if (oCatalogue.moRecord.moEntry.IsStored())
         oAction(oCatalogue.moRecord.moEntry, "the record of metadata");
-    const auto Walk = [&](const Plane& oPlane)
+    const auto Walk = [&](const Plane& oPlane, const std::map<unsigned int, ImageSize>& oLevels)
     {
         for (const auto& [nLevel, poTable] : oPlane.moTables)
         {
-            const std::uint64_t nAcross =
-                (std::uint64_t{(oCatalogue.mnWidth - 1) / nLevel} + 1 - 1) / oCatalogue.mnBlockWidth + 1;
+            const ImageSize& oSize = nLevel == 1 ? oCatalogue.moSize : oLevels.at(nLevel);
+            const std::uint64_t nAcross = (oSize.mnWidth - 1) / oCatalogue.mnBlockWidth + 1;
             poTable->ForEach(
                 *mpoStore, false,
                 [&](const TileTable::Tile& oTile, std::uint64_t nTile)
@@ -346,11 +355,11 @@ void KrvdskDataset::ForEachPiece(const std::function<void(const Entry& oEntry, c
         }
     };
     for (const std::shared_ptr<Plane>& poPlane : oCatalogue.moPlanes)
-        Walk(*poPlane);
+        Walk(*poPlane, oCatalogue.moLevels);
     for (const auto& [nNumber, oSegment] : oCatalogue.moSegments)
     {
         if (oSegment.mpoPlane)
-            Walk(*oSegment.mpoPlane);
+            Walk(*oSegment.mpoPlane, oCatalogue.moBitmapLevels);
         else if (oSegment.moBytes.moEntry.IsStored())
             oAction(oSegment.moBytes.moEntry, oSegment.Describe(nNumber));
     }

@@ -112,6 +112,7 @@ public:
 protected:
     void StoreRecord(const support::RecordText& oRecord) const override;
     std::uint64_t MakeRoom(unsigned int nLevel) override { return nLevel; }
+    Level DescribeLevel(unsigned int nLevel) const override;
     std::shared_ptr<support::IBlockSource> MakeLevelSource(unsigned int nLevel, std::uint64_t nPlace) override;
 
 private:
@@ -141,7 +142,7 @@ private:
                              std::vector<unsigned int> (Facet::*pList)() const) const;
     void ShowImage();
     std::shared_ptr<support::IBlockSource> MakeSource(std::vector<std::shared_ptr<Plane>> oPlanes, unsigned int nLevel,
-                                                      std::function<void()> oBeforeWrite) const;
+                                                      const ImageSize& oSize, std::function<void()> oBeforeWrite) const;
     void AddPlanes(Catalogue& oCatalogue, const std::vector<krv::gobs::DataType>& oTypes, const Place& oPlace) const;
     void ChangeChannels(const std::vector<unsigned int>& oSources);
     // Everything that the state names, but for its root.

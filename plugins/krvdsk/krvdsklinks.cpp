@@ -36,15 +36,15 @@ void KrvdskDataset::ShowLink()
     const Catalogue& oCatalogue = GetCatalogue();
     mpoLink.reset();
     if (!oCatalogue.moLinkPath.empty())
-        mpoLink = std::make_shared<Link>(GetFileName(), oCatalogue.moLinkPath, oCatalogue.mnWidth, oCatalogue.mnHeight,
-                                         oCatalogue.moLinked);
+        mpoLink = std::make_shared<Link>(GetFileName(), oCatalogue.moLinkPath, oCatalogue.moSize.mnWidth,
+                                         oCatalogue.moSize.mnHeight, oCatalogue.moLinked);
 }
 
 // The file's own segments begin behind the linked file's numbers, so that references to those stay true.
 void KrvdskDataset::LinkChannels(Catalogue& oCatalogue, const std::vector<krv::gobs::DataType>& oTypes,
                                  const Place& oPlace) const
 {
-    Link oLink(GetFileName(), oCatalogue.moLinkPath, oCatalogue.mnWidth, oCatalogue.mnHeight, {});
+    Link oLink(GetFileName(), oCatalogue.moLinkPath, oCatalogue.moSize.mnWidth, oCatalogue.moSize.mnHeight, {});
     oCatalogue.moLinked = FindLinkableChannels(oLink.Get(oPlace));
     const bool bSame = std::equal(oTypes.begin(), oTypes.end(), oCatalogue.moLinked.begin(), oCatalogue.moLinked.end(),
                                   [](const krv::gobs::DataType& oType, const Link::Channel& oChannel)

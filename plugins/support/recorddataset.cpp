@@ -100,8 +100,13 @@ std::vector<LevelStore::Level> RecordDataset::GetLevels() const
 {
     std::vector<Level> oLevels;
     for (const auto& [nLevel, nPlace] : moRecord.moLevels)
-        oLevels.push_back({nLevel, (GetWidth() - 1) / nLevel + 1, (GetHeight() - 1) / nLevel + 1});
+        oLevels.push_back(DescribeLevel(nLevel));
     return oLevels;
+}
+
+LevelStore::Level RecordDataset::DescribeLevel(unsigned int nLevel) const
+{
+    return {nLevel, (GetWidth() - 1) / nLevel + 1, (GetHeight() - 1) / nLevel + 1};
 }
 
 std::shared_ptr<BlockImage> RecordDataset::OpenLevel(unsigned int nLevel)

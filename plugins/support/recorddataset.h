@@ -13,7 +13,7 @@ namespace krv::plugins::support
 // A dataset whose metadata, reference system, geocoding and directory of levels are one record: a format says where
 // that is kept, as text or in another form, and where the pixels are. Levels can be made as long as the file is
 // written.
-class RecordDataset : public Dataset, public krv::datasources::IGeocodedDataset, private LevelStore
+class RecordDataset : public Dataset, public krv::datasources::IGeocodedDataset, protected LevelStore
 {
 public:
     krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
@@ -44,6 +44,8 @@ protected:
     virtual void StoreRecord(const RecordText& oRecord) const = 0;
     // Room for a level that is not there, by the number that will find it.
     virtual std::uint64_t MakeRoom(unsigned int nLevel) = 0;
+    // A level that is there: of the size that its number gives, unless overridden.
+    virtual Level DescribeLevel(unsigned int nLevel) const;
     // The pixels of a level.
     virtual std::shared_ptr<IBlockSource> MakeLevelSource(unsigned int nLevel, std::uint64_t nPlace) = 0;
 

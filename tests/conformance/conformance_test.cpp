@@ -44,6 +44,23 @@ int RunProgram(const std::string& arguments)
 
 } // namespace
 
+// Datasets without a file behave as any other: what has to do with the bytes of a file aside.
+TEST(Conformance, DatasetsWithoutAFilePass)
+{
+    const krv::conformance::TempFolder oFolder;
+    const Plugin oPlugin(Fixture("fileless"));
+    for (const char* const pKind : {"memory", "constant", "pairs"})
+        for (const Check& oCheck : GetChecks())
+        {
+            const std::string name = oCheck.mpName;
+            if (name == "writing" || name == "truncated" || name == "damaged")
+                continue;
+            for (const std::string& finding :
+                 krv::conformance::Run(oCheck, oPlugin, oFolder.Write(pKind, std::string("FILELESS ") + pKind)))
+                ADD_FAILURE() << pKind << ", " << name << ": " << finding;
+        }
+}
+
 // Every check finds its faults, and a good plug-in passes them all.
 TEST(Conformance, ChecksFindWhatIsWrong)
 {

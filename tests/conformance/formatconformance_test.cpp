@@ -87,6 +87,12 @@ private:
 
 const FormatTraits FORMATS[] = {
     {"DEMO", "demo", {""}, true, true, 1},
+    {"JP2",
+     "jp2",
+     {"", "BLOCKXSIZE=64 BLOCKYSIZE=48", "BLOCKXSIZE=100 BLOCKYSIZE=20 LEVELS=2 PROGRESSION=RPCL BOXES=NO"},
+     false,
+     false,
+     1},
     {"RAW",
      "raw",
      {"", "INTERLEAVE=BIL", "INTERLEAVE=BIP", "BYTEORDER=BIG", "INTERLEAVE=BIL BYTEORDER=BIG",

@@ -9,6 +9,7 @@
 #include "datasources/reader/rasterrange.h"
 #include "datasources/writer/basicwriter.h"
 #include "gobs/raster/raster.h"
+#include "tests/soak/soakrun.h"
 #include "toolkit/core/hmalloc.h"
 #include "tools/conformance/tempfolder.h"
 
@@ -32,24 +33,9 @@ using krv::conformance::TempFolder;
 using krv::datasources::BasicReader;
 using krv::datasources::BasicWriter;
 using krv::gobs::Raster;
-
-unsigned int FromEnvironment(const char* pName, unsigned int nDefault)
-{
-    const char* const pText = std::getenv(pName);
-    return pText != nullptr ? static_cast<unsigned int>(std::strtoul(pText, nullptr, 10)) : nDefault;
-}
-
-unsigned int Rounds()
-{
-    return FromEnvironment("KRV_SOAK_ROUNDS", 12);
-}
-
-using Random = std::linear_congruential_engine<unsigned int, 48271, 0, 2147483647>;
-
-Random MakeRandom(unsigned int nStream)
-{
-    return Random(FromEnvironment("KRV_SOAK_SEED", 1) * 100 + nStream + 1);
-}
+using krv::test::MakeRandom;
+using krv::test::Random;
+using krv::test::Rounds;
 
 // Values that compress to about half, whatever is written over what.
 void FillNoise(Raster& oRaster, Random& oRandom)

@@ -30,7 +30,7 @@ BEGIN {
     home["^(xercesc|xalanc)/"] = "^(toolkit/xml|datasources/iomanager|datasources/formatregistrar)/";
     home["^boost/"] = "^datasources/metadata/";
     home["^(proj\\.h|proj/)"] = "^toolkit/ogc/cs/";
-    home["^(tiff|tiffio|geotiff|geo_|geokeys|geovalues|xtiffio)"] = "^(plugins/tif|tools/samplescene)/";
+    home["^(tiff|tiffio|geotiff|geo_|geokeys|geovalues|xtiffio)"] = "^(plugins/tif|plugins/support/geotiff|tools/samplescene)/";
     home["^(libdeflate|zstd|lz4|lz4hc|zlib)\\.h"] = "^(plugins/support|plugins/tif|operations)/";
     home["^openjpeg"] = "^plugins/jp2/";
     home["^(CLI|nlohmann)/"] = "^tools/";

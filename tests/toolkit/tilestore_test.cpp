@@ -331,6 +331,34 @@ TEST(TileStoreTest, NobodyWaitsWhileThreadsMakeTilesOfEachOther)
     EXPECT_TRUE(Shows(oOwner.Find(Request(3)), 3));
 }
 
+// Tiles made of what readers give wait for the blocks below them: nobody decodes one twice.
+TEST(TileStoreTest, WhoMakesADerivedTileWaitsForTheBlocksOfIt)
+{
+    TileStore oStore(100 * COST);
+    const TileOwner oBlocks(oStore), oDerived(oStore, TileLayer::eDerived);
+    Maker oMakeBlock;
+    std::thread oThread;
+    oBlocks.Obtain(Request(1),
+                   [&](unsigned char* pBytes)
+                   {
+                       oThread = std::thread(
+                           [&]
+                           {
+                               oDerived.Obtain(Request(9),
+                                               [&](unsigned char* pDerived)
+                                               {
+                                                   EXPECT_TRUE(Shows(oMakeBlock(oBlocks, Request(1)), 1));
+                                                   Fill(9, pDerived);
+                                               });
+                           });
+                       while (oStore.GetStatistics().mnWaits == 0)
+                           std::this_thread::yield();
+                       Fill(1, pBytes);
+                   });
+    oThread.join();
+    EXPECT_EQ(oMakeBlock.mnMade, 0);
+}
+
 TEST(TileStoreTest, ThreadsThatWaitGetTheTileOrItsException)
 {
     TileStore oStore(100 * COST);

@@ -136,10 +136,13 @@ void TileClaim::End(int nState, const std::exception_ptr& oFailure) noexcept
     mpoStore->Release(poEntry);
 }
 
-TileOwner::TileOwner(TileStore& oStore) : moStore(*oStore.mpoStore), mpoState(moStore.AddOwner()) {}
+TileOwner::TileOwner(TileStore& oStore, TileLayer eLayer)
+    : moStore(*oStore.mpoStore), mpoState(moStore.AddOwner(eLayer))
+{
+}
 
-TileOwner::TileOwner(const std::string& identity, TileStore& oStore)
-    : moStore(*oStore.mpoStore), mpoState(moStore.AddOwner(identity))
+TileOwner::TileOwner(const std::string& identity, TileStore& oStore, TileLayer eLayer)
+    : moStore(*oStore.mpoStore), mpoState(moStore.AddOwner(identity, eLayer))
 {
 }
 

@@ -77,6 +77,13 @@ struct TileStatistics
     std::uint64_t mnPeak = 0;      // the most of these bytes there were
 };
 
+// What tiles are made of. A thread that makes derived ones waits for blocks which others decode.
+enum class TileLayer
+{
+    eBlocks, // of files
+    eDerived // of what readers give
+};
+
 class TileClaim;
 class TileOwner;
 
@@ -145,8 +152,9 @@ private:
 };
 
 // The task to make a tile; others that want it wait. It is done on the thread that got it, which may look for other
-// tiles meanwhile and never waits for one then: what another thread is making it gets a claim of its own for. So no two
-// threads ever wait for each other. One that goes undone has those who wait look again.
+// tiles meanwhile and then waits only for tiles of a lower layer: of its own or a higher one it gets a claim of its own
+// for what another thread is making. So threads never wait in a circle. A claim that goes undone has those who wait
+// look again.
 class KRV_TOOLKIT_API TileClaim
 {
 public:
@@ -190,9 +198,10 @@ class KRV_TOOLKIT_API TileOwner
 {
 public:
     // Shares with nobody.
-    explicit TileOwner(TileStore& oStore = TileStore::Process());
-    // identity: any bytes that say all of what decides which bytes a tile has.
-    explicit TileOwner(const std::string& identity, TileStore& oStore = TileStore::Process());
+    explicit TileOwner(TileStore& oStore = TileStore::Process(), TileLayer eLayer = TileLayer::eBlocks);
+    // identity: any bytes that say all of what decides which bytes a tile has. One identity is of one layer.
+    explicit TileOwner(const std::string& identity, TileStore& oStore = TileStore::Process(),
+                       TileLayer eLayer = TileLayer::eBlocks);
     ~TileOwner();
     TileOwner(const TileOwner&) = delete;
     TileOwner& operator=(const TileOwner&) = delete;

@@ -88,8 +88,7 @@ private:
 
 } // namespace
 
-template <typename Base>
-PairIO<Base>::PairIO(std::unique_ptr<IRasterIO> poFirst, std::unique_ptr<IRasterIO> poSecond, PairForm oForm)
+PairIO::PairIO(std::unique_ptr<IRasterIO> poFirst, std::unique_ptr<IRasterIO> poSecond, PairForm oForm)
     : mpoFirst(std::move(poFirst)), mpoSecond(std::move(poSecond)), moForm(std::move(oForm)),
       mbDirect(!moForm.mbPolar && moForm.moSource == PartType(moForm.moComplex))
 {
@@ -97,12 +96,10 @@ PairIO<Base>::PairIO(std::unique_ptr<IRasterIO> poFirst, std::unique_ptr<IRaster
         mbDirect = mbDirect && (!oNoData || oNoData->mbAsItIs);
 }
 
-template <typename Base>
-PairIO<Base>::~PairIO() = default;
+PairIO::~PairIO() = default;
 
 // With two sources the samples of a pair are brought together.
-template <typename Base>
-void PairIO<Base>::ReadSource(const PixelRect& oRect, unsigned char* pSamples)
+void PairIO::ReadSource(const PixelRect& oRect, unsigned char* pSamples)
 {
     if (mpoSecond == nullptr)
         return mpoFirst->ReadWindow(oRect.mnX, oRect.mnY, oRect.mnWidth, oRect.mnHeight, pSamples);
@@ -123,8 +120,7 @@ void PairIO<Base>::ReadSource(const PixelRect& oRect, unsigned char* pSamples)
     moMerger->Run({oBoth.get(), pSecond}, pSamples, nPixels);
 }
 
-template <typename Base>
-void PairIO<Base>::WriteSource(const PixelRect& oRect, unsigned char* pSamples)
+void PairIO::WriteSource(const PixelRect& oRect, unsigned char* pSamples)
 {
     if (mpoSecond == nullptr)
         return mpoFirst->WriteWindow(oRect.mnX, oRect.mnY, oRect.mnWidth, oRect.mnHeight, pSamples);
@@ -147,8 +143,7 @@ void PairIO<Base>::WriteSource(const PixelRect& oRect, unsigned char* pSamples)
     mpoSecond->WriteWindow(oRect.mnX, oRect.mnY, oRect.mnWidth, oRect.mnHeight, pSecond);
 }
 
-template <typename Base>
-void PairIO<Base>::ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch)
+void PairIO::ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch)
 {
     const Packed oTarget(pTarget, oRect, GetPixelBytes(), nPitch);
     const std::uint64_t nPixels = std::uint64_t{oRect.mnWidth} * oRect.mnHeight;
@@ -163,8 +158,7 @@ void PairIO<Base>::ReadPixels(const PixelRect& oRect, unsigned char* pTarget, st
     oTarget.Give();
 }
 
-template <typename Base>
-void PairIO<Base>::WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch)
+void PairIO::WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch)
 {
     const Packed oSource(const_cast<unsigned char*>(pSource), oRect, GetPixelBytes(), nPitch); // only read
     oSource.Fetch();
@@ -176,8 +170,7 @@ void PairIO<Base>::WritePixels(const PixelRect& oRect, const unsigned char* pSou
     WriteSource(oRect, oSamples.get());
 }
 
-template <typename Base>
-void PairIO<Base>::Join(const unsigned char* pSamples, unsigned char* pComplex, std::size_t nPixels) const
+void PairIO::Join(const unsigned char* pSamples, unsigned char* pComplex, std::size_t nPixels) const
 {
     const std::size_t nPairs = GetPairs();
     if (!moForm.mbPolar)
@@ -215,8 +208,7 @@ void PairIO<Base>::Join(const unsigned char* pSamples, unsigned char* pComplex, 
     VisitTypes(moForm, Work);
 }
 
-template <typename Base>
-void PairIO<Base>::Part(const unsigned char* pComplex, unsigned char* pSamples, std::size_t nPixels) const
+void PairIO::Part(const unsigned char* pComplex, unsigned char* pSamples, std::size_t nPixels) const
 {
     const std::size_t nPairs = GetPairs();
     if (!moForm.mbPolar)
@@ -253,12 +245,62 @@ void PairIO<Base>::Part(const unsigned char* pComplex, unsigned char* pSamples, 
     VisitTypes(moForm, Work);
 }
 
-template class PairIO<IRasterIO>;
-template class PairIO<IOverviewIO>;
+template <typename Base>
+StackedIO<Base>::StackedIO(std::vector<Part> oParts, std::size_t nValueBytes)
+    : moParts(std::move(oParts)), mnValueBytes(nValueBytes)
+{
+    for (const Part& oPart : moParts)
+    {
+        for (std::size_t n = 0; n < oPart.moPositions.size(); ++n)
+            mbStraight = mbStraight && oPart.moPositions[n] == n;
+        mnChannels += oPart.moPositions.size();
+    }
+    mbStraight = mbStraight && moParts.size() == 1;
+}
 
-PairLevelIO::PairLevelIO(unsigned int nLevel, std::unique_ptr<IRasterIO> poFirst, std::unique_ptr<IRasterIO> poSecond,
-                         PairForm oForm)
-    : PairIO(std::move(poFirst), std::move(poSecond), std::move(oForm)), mnLevel(nLevel)
+template <typename Base>
+StackedIO<Base>::~StackedIO() = default;
+
+template <typename Base>
+void StackedIO<Base>::ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch)
+{
+    const krv::raster::PixelArea oArea{oRect.mnWidth, oRect.mnHeight, mnValueBytes};
+    const std::size_t nRow = oRect.mnWidth * mnValueBytes;
+    if (mbStraight && nPitch == nRow * mnChannels)
+        return moParts.front().mpoIO->ReadWindow(oRect.mnX, oRect.mnY, oRect.mnWidth, oRect.mnHeight, pTarget);
+    const HBlock oPlane = Allocate(nRow * oRect.mnHeight);
+    for (const Part& oPart : moParts)
+    {
+        const std::size_t nOwn = oPart.moPositions.size();
+        const HBlock oPixels = Allocate(nRow * nOwn * oRect.mnHeight);
+        oPart.mpoIO->ReadWindow(oRect.mnX, oRect.mnY, oRect.mnWidth, oRect.mnHeight, oPixels.get());
+        for (std::size_t n = 0; n < nOwn; ++n)
+        {
+            krv::raster::ExtractChannel(oPixels.get(), nRow * nOwn, n, nOwn, oPlane.get(), nRow, oArea);
+            krv::raster::PlaceChannel(oPlane.get(), nRow, pTarget, nPitch, oPart.moPositions[n], mnChannels, oArea);
+        }
+    }
+}
+
+template <typename Base>
+void StackedIO<Base>::WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch)
+{
+    const krv::raster::PixelArea oArea{oRect.mnWidth, oRect.mnHeight, mnValueBytes};
+    const std::size_t nRow = oRect.mnWidth * mnValueBytes;
+    for (const Part& oPart : moParts)
+    {
+        const HBlock oPixels = Allocate(nRow * oPart.moPositions.size() * oRect.mnHeight);
+        krv::raster::GatherChannels(pSource, nPitch, mnChannels, oPixels.get(), nRow * oPart.moPositions.size(),
+                                    oPart.moPositions.data(), oPart.moPositions.size(), oArea);
+        oPart.mpoIO->WriteWindow(oRect.mnX, oRect.mnY, oRect.mnWidth, oRect.mnHeight, oPixels.get());
+    }
+}
+
+template class StackedIO<IRasterIO>;
+template class StackedIO<IOverviewIO>;
+
+PairLevelIO::PairLevelIO(unsigned int nLevel, std::vector<Part> oParts, std::size_t nValueBytes)
+    : StackedIO(std::move(oParts), nValueBytes), mnLevel(nLevel)
 {
 }
 

@@ -32,9 +32,8 @@ struct PairForm
     std::vector<std::optional<PairNoData>> moNoData; // of each pair
 };
 
-// Reads and writes through the I/O of the sources, which it owns. Base is IRasterIO or IOverviewIO.
-template <typename Base>
-class PairIO : public WindowedIO<Base>
+// Reads and writes through the I/O of the sources, which it owns.
+class PairIO : public WindowedIO<IRasterIO>
 {
 public:
     // With one source its channels are the first and the second of each pair in turn; with two, poSecond has the second
@@ -66,15 +65,45 @@ private:
     std::optional<krv::raster::Splitter> moSplitter;
 };
 
-extern template class PairIO<IRasterIO>;
-extern template class PairIO<IOverviewIO>;
-
-// Of one level.
-class PairLevelIO : public PairIO<IOverviewIO>
+// Channels of one type and size that come from several I/O objects.
+template <typename Base>
+class StackedIO : public WindowedIO<Base>
 {
 public:
-    PairLevelIO(unsigned int nLevel, std::unique_ptr<IRasterIO> poFirst, std::unique_ptr<IRasterIO> poSecond,
-                PairForm oForm);
+    struct Part
+    {
+        std::unique_ptr<IRasterIO> mpoIO;
+        std::vector<std::size_t> moPositions; // of its channels, from 0
+    };
+
+    // The parts place every channel once.
+    StackedIO(std::vector<Part> oParts, std::size_t nValueBytes);
+    ~StackedIO() override;
+
+    unsigned int GetFileWidth() const override { return moParts.front().mpoIO->GetFileWidth(); }
+    unsigned int GetFileHeight() const override { return moParts.front().mpoIO->GetFileHeight(); }
+    unsigned int GetTileWidth() const override { return moParts.front().mpoIO->GetTileWidth(); }
+    unsigned int GetTileHeight() const override { return moParts.front().mpoIO->GetTileHeight(); }
+
+private:
+    std::size_t GetPixelBytes() const override { return mnChannels * mnValueBytes; }
+    void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) override;
+    void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) override;
+
+    std::vector<Part> moParts;
+    std::size_t mnChannels = 0;
+    std::size_t mnValueBytes;
+    bool mbStraight = true; // one part, whose channels are these
+};
+
+extern template class StackedIO<IRasterIO>;
+extern template class StackedIO<IOverviewIO>;
+
+// Of one level.
+class PairLevelIO : public StackedIO<IOverviewIO>
+{
+public:
+    PairLevelIO(unsigned int nLevel, std::vector<Part> oParts, std::size_t nValueBytes);
     ~PairLevelIO() override;
 
     unsigned int GetLevel() const override { return mnLevel; }

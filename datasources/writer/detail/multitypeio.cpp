@@ -5,6 +5,7 @@
 #include "toolkit/core/hblock.h"
 #include "toolkit/exceptions/exceptions.h"
 
+#include <algorithm>
 #include <string>
 #include <utility>
 
@@ -69,6 +70,19 @@ void ForEachRun(const PixelRect& oRect, std::size_t nPixelBytes, std::size_t nPi
         oWork(nRow, oRect.mnWidth);
 }
 
+// Cuts a rectangle after rows of blocks, so that what lies between a raster and its groups stays small.
+template <typename Work>
+void ForEachBand(const PixelRect& oRect, unsigned int nBlockHeight, const Work& oWork)
+{
+    const std::uint64_t nBottom = std::uint64_t{oRect.mnY} + oRect.mnHeight;
+    for (std::uint64_t nY = oRect.mnY; nY < nBottom;)
+    {
+        const std::uint64_t nEnd = std::min((nY / nBlockHeight + 1) * nBlockHeight, nBottom);
+        oWork(PixelRect{oRect.mnX, static_cast<unsigned int>(nY), oRect.mnWidth, static_cast<unsigned int>(nEnd - nY)});
+        nY = nEnd;
+    }
+}
+
 } // namespace
 
 MultiTypeIO::MultiTypeIO(std::vector<WriterGroup> oGroups, const krv::gobs::DataType& oType,
@@ -80,6 +94,7 @@ MultiTypeIO::MultiTypeIO(std::vector<WriterGroup> oGroups, const krv::gobs::Data
     {
         oTargets.push_back(
             {krv::gobs::QRFDataType2RasterBufferType(oGroup.mpoWriter->GetDataType()), oGroup.moPositions});
+        mnBlockHeight = std::max(mnBlockHeight, oGroup.mpoWriter->GetTileHeight());
         moSplitPositions.insert(moSplitPositions.end(), oGroup.moPositions.begin(), oGroup.moPositions.end());
     }
     mnPixelBytes = moSplitPositions.size() * (oType.GetValueBits() / 8);
@@ -105,16 +120,30 @@ void MultiTypeIO::ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std
         }
         moMerger.emplace(oSources, krv::gobs::QRFDataType2RasterBufferType(moType), oPlaces);
     }
-    Parts oParts(moGroups, oRect);
-    for (std::size_t nGroup = 0; nGroup < moGroups.size(); ++nGroup)
-        moGroups[nGroup].mpoWriter->ReadRaster(&oParts.Get(nGroup));
-    ForEachRun(oRect, mnPixelBytes, nPitch,
-               [&](std::size_t nRow, std::uint64_t nPixels)
-               { moMerger->Run(oParts.GetRow<const unsigned char>(nRow), pTarget + nRow * nPitch, nPixels); });
+    ForEachBand(oRect, mnBlockHeight,
+                [&](const PixelRect& oBand)
+                {
+                    Parts oParts(moGroups, oBand);
+                    for (std::size_t nGroup = 0; nGroup < moGroups.size(); ++nGroup)
+                        moGroups[nGroup].mpoWriter->ReadRaster(&oParts.Get(nGroup));
+                    unsigned char* const pBand = pTarget + (oBand.mnY - oRect.mnY) * nPitch;
+                    ForEachRun(
+                        oBand, mnPixelBytes, nPitch,
+                        [&](std::size_t nRow, std::uint64_t nPixels)
+                        { moMerger->Run(oParts.GetRow<const unsigned char>(nRow), pBand + nRow * nPitch, nPixels); });
+                });
 }
 
-// Everything is converted before anything is written.
+// A strict writer converts everything before it writes anything.
 void MultiTypeIO::WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch)
+{
+    if (mpoChanges->mbStrict)
+        return WriteBand(oRect, pSource, nPitch);
+    ForEachBand(oRect, mnBlockHeight,
+                [&](const PixelRect& oBand) { WriteBand(oBand, pSource + (oBand.mnY - oRect.mnY) * nPitch, nPitch); });
+}
+
+void MultiTypeIO::WriteBand(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch)
 {
     Parts oParts(moGroups, oRect);
     std::vector<std::uint64_t> oChanged(moSplitPositions.size());

@@ -50,11 +50,13 @@ private:
     std::size_t GetPixelBytes() const override { return mnPixelBytes; }
     void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) override;
     void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) override;
+    void WriteBand(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch);
     void TakeChanges(const PixelRect& oRect, const std::vector<std::uint64_t>& oChanged);
 
     std::vector<WriterGroup> moGroups; // ascending by data type
     krv::gobs::DataType moType;
     std::size_t mnPixelBytes = 0;
+    unsigned int mnBlockHeight = 1; // of the highest blocks
     std::shared_ptr<SampleChanges> mpoChanges;
     std::vector<unsigned int> moSplitPositions; // of the splitter's channels, in its order
     std::optional<krv::raster::Splitter> moSplitter;

@@ -1,5 +1,6 @@
 #include "plugins/jp2/reading/decoder.h"
 
+#include "plugins/jp2/reading/messages.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -120,23 +121,6 @@ struct CodecDeleter
     void operator()(opj_codec_t* pCodec) const { opj_destroy_codec(pCodec); }
 };
 
-// The first message counts; the others follow from it.
-struct Messages
-{
-    char maError[256] = {};
-
-    static void OnError(const char* pText, void* pThis)
-    {
-        auto& oThis = *static_cast<Messages*>(pThis);
-        if (oThis.maError[0] != '\0' || pText == nullptr)
-            return;
-        std::strncpy(oThis.maError, pText, sizeof(oThis.maError) - 1);
-        oThis.maError[std::strcspn(oThis.maError, "\n")] = '\0';
-    }
-
-    static void Ignore(const char*, void*) {}
-};
-
 } // namespace
 
 ImagePtr Decode(support::File& oFile, const std::vector<Codestream::Piece>& oPieces, const DecodeRequest& oRequest,
@@ -147,9 +131,7 @@ ImagePtr Decode(support::File& oFile, const std::vector<Codestream::Piece>& oPie
     if (!poCodec)
         throw std::bad_alloc();
     Messages oMessages;
-    opj_set_error_handler(poCodec.get(), &Messages::OnError, &oMessages);
-    opj_set_warning_handler(poCodec.get(), &Messages::Ignore, nullptr);
-    opj_set_info_handler(poCodec.get(), &Messages::Ignore, nullptr);
+    oMessages.Watch(poCodec.get());
     opj_dparameters_t oParameters;
     opj_set_default_decoder_parameters(&oParameters);
     oParameters.cp_reduce = oRequest.mnReduce;
@@ -180,10 +162,9 @@ ImagePtr Decode(support::File& oFile, const std::vector<Codestream::Piece>& oPie
     };
     const bool bDone = Run();
     oStream.Rethrow();
-    if (!bDone || oMessages.maError[0] != '\0')
+    if (!bDone || oMessages.HasError())
         throw krv::FileFormatException(oFile.GetName(),
-                                       oFile.GetName() + ": " + what + " cannot be decoded: " +
-                                           (oMessages.maError[0] != '\0' ? oMessages.maError : "it is damaged"));
+                                       oFile.GetName() + ": " + what + " cannot be decoded: " + oMessages.Get());
     return poImage;
 }
 

@@ -1,5 +1,6 @@
 #include "plugins/jp2/reading/jp2source.h"
 
+#include "plugins/jp2/reading/samplecopy.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -14,14 +15,6 @@ namespace
 constexpr std::uint64_t STRUCTURE_BYTES = std::uint64_t{192} << 20;
 constexpr unsigned int MOST_BITS = 31; // OpenJPEG's samples
 
-// Samples of a component that belong to a rectangle of pixels.
-struct Samples
-{
-    const opj_image_comp_t* mpComponent;
-    std::vector<std::size_t> moColumns; // of each pixel; empty when they are pixels
-    std::vector<std::size_t> moRows;
-};
-
 std::vector<std::size_t> FindSamples(std::uint64_t nFirstPixel, std::size_t nPixels, std::uint32_t nStep,
                                      std::uint32_t nFirstSample, std::uint32_t nSamples)
 {
@@ -31,26 +24,6 @@ std::vector<std::size_t> FindSamples(std::uint64_t nFirstPixel, std::size_t nPix
             std::clamp<std::uint64_t>((nFirstPixel + nAt) / nStep, nFirstSample, nFirstSample + nSamples - 1) -
             nFirstSample);
     return oSamples;
-}
-
-template <typename T>
-void CopySamples(const std::vector<Samples>& oComponents, const support::PixelRect& oPart, unsigned char* pTarget,
-                 std::size_t nPitch)
-{
-    const std::size_t nChannels = oComponents.size();
-    for (std::size_t nRow = 0; nRow < oPart.mnHeight; ++nRow)
-        for (std::size_t nChannel = 0; nChannel < nChannels; ++nChannel)
-        {
-            const Samples& oSamples = oComponents[nChannel];
-            const OPJ_INT32* pSource = oSamples.mpComponent->data + oSamples.moRows[nRow] * oSamples.mpComponent->w;
-            T* pRow = reinterpret_cast<T*>(pTarget + nRow * nPitch) + nChannel;
-            if (oSamples.moColumns.empty())
-                for (std::size_t nAt = 0; nAt < oPart.mnWidth; ++nAt)
-                    pRow[nAt * nChannels] = static_cast<T>(pSource[nAt]);
-            else
-                for (std::size_t nAt = 0; nAt < oPart.mnWidth; ++nAt)
-                    pRow[nAt * nChannels] = static_cast<T>(pSource[oSamples.moColumns[nAt]]);
-        }
 }
 
 } // namespace
@@ -88,8 +61,8 @@ std::size_t Jp2Source::CountDecoded(const Codestream& oStream)
     return oStream.HasColourTransform() ? oStream.GetComponents().size() : 1;
 }
 
-Jp2Source::Jp2Source(std::shared_ptr<Codestream> poStream, unsigned int nReduce)
-    : mpoStream(std::move(poStream)), moResolution(*mpoStream, nReduce, CountDecoded(*mpoStream)),
+Jp2Source::Jp2Source(std::shared_ptr<Codestream> poStream, unsigned int nReduce, std::uint64_t nBlockBytes)
+    : mpoStream(std::move(poStream)), moResolution(*mpoStream, nReduce, CountDecoded(*mpoStream), nBlockBytes),
       moLayout(MakeLayout())
 {
     std::size_t nFirst = 0;
@@ -159,15 +132,7 @@ void Jp2Source::ReadPixels(unsigned int nPlane, const support::PixelRect& oPixel
                                       oComponent.mnStepY, nY, oDecoded.h);
         oComponents.push_back(std::move(oSamples));
     }
-    switch (support::ImageLayout::GetValueBytes(oPlane.moType))
-    {
-    case 1:
-        return CopySamples<std::uint8_t>(oComponents, oPixels, pTarget, nPitch);
-    case 2:
-        return CopySamples<std::uint16_t>(oComponents, oPixels, pTarget, nPitch);
-    default:
-        return CopySamples<std::uint32_t>(oComponents, oPixels, pTarget, nPitch);
-    }
+    CopySamples(oComponents, oPlane.moType, oPixels.mnWidth, oPixels.mnHeight, pTarget, nPitch);
 }
 
 } // namespace krv::plugins::jp2

@@ -17,8 +17,10 @@ namespace krv::plugins::jp2
 class Jp2Source : public support::IBlockSource
 {
 public:
-    // nReduce: resolutions left out. Throws FileFormatException for components that no type holds.
-    Jp2Source(std::shared_ptr<Codestream> poStream, unsigned int nReduce);
+    // nReduce: resolutions left out. nBlockBytes: larger tiles are decoded by areas. Throws FileFormatException for
+    // components that no type holds.
+    Jp2Source(std::shared_ptr<Codestream> poStream, unsigned int nReduce,
+              std::uint64_t nBlockBytes = Resolution::BLOCK_BYTES);
     ~Jp2Source() override;
 
     const support::ImageLayout& GetLayout() const override { return moLayout; }

@@ -10,8 +10,6 @@ namespace krv::plugins::jp2
 namespace
 {
 
-// Of decoded samples, four bytes each.
-constexpr std::uint64_t BLOCK_BYTES = std::uint64_t{256} << 20;
 constexpr std::uint64_t SAMPLE_BYTES = 4;
 // Decoding a part of a tile takes the samples twice.
 constexpr std::uint64_t AREA_SAMPLE_BYTES = 8;
@@ -60,7 +58,8 @@ std::uint32_t ChooseBlock(const Axis& oAxis, unsigned int nReduce)
 
 } // namespace
 
-Resolution::Resolution(const Codestream& oStream, unsigned int nReduce, std::size_t nComponents)
+Resolution::Resolution(const Codestream& oStream, unsigned int nReduce, std::size_t nComponents,
+                       std::uint64_t nBlockBytes)
     : moStream(oStream), mnReduce(nReduce)
 {
     const GridRect& oImage = oStream.GetImage();
@@ -72,10 +71,10 @@ Resolution::Resolution(const Codestream& oStream, unsigned int nReduce, std::siz
         moStepsY.insert(oOne.mnStepY);
     }
     if (GetWidth() > 0 && GetHeight() > 0)
-        ChooseBlocks(nComponents);
+        ChooseBlocks(nComponents, nBlockBytes);
 }
 
-void Resolution::ChooseBlocks(std::size_t nComponents)
+void Resolution::ChooseBlocks(std::size_t nComponents, std::uint64_t nBlockBytes)
 {
     const GridRect& oImage = moStream.GetImage();
     mnBlockWidth = ChooseBlock(
@@ -83,14 +82,14 @@ void Resolution::ChooseBlocks(std::size_t nComponents)
         mnReduce);
     mnBlockHeight = ChooseBlock(
         {oImage.mnY0, moStream.GetTileTop(), moStream.GetTileHeight(), moStream.GetTilesDown(), GetHeight()}, mnReduce);
-    if (std::uint64_t{mnBlockWidth} * mnBlockHeight <= BLOCK_BYTES / SAMPLE_BYTES / nComponents)
+    if (std::uint64_t{mnBlockWidth} * mnBlockHeight <= nBlockBytes / SAMPLE_BYTES / nComponents)
         return;
     const auto ToArea = [](double nSize) -> std::uint32_t
     {
         const auto nPixels = static_cast<std::uint32_t>(std::max(nSize, static_cast<double>(SMALL_BLOCK)));
         return nPixels < AREA_STEP + AREA_SHIFT ? nPixels : (nPixels - AREA_SHIFT) / AREA_STEP * AREA_STEP + AREA_SHIFT;
     };
-    const double nPixels = static_cast<double>(BLOCK_BYTES / AREA_SAMPLE_BYTES) / static_cast<double>(nComponents);
+    const double nPixels = static_cast<double>(nBlockBytes / AREA_SAMPLE_BYTES) / static_cast<double>(nComponents);
     const double nSide = std::sqrt(nPixels);
     if (mnBlockHeight <= nSide)
         mnBlockWidth = ToArea(nPixels / mnBlockHeight);

@@ -15,8 +15,12 @@ namespace krv::plugins::jp2
 class Resolution
 {
 public:
+    // Of the samples of a block while it is decoded.
+    static constexpr std::uint64_t BLOCK_BYTES = std::uint64_t{256} << 20;
+
     // nReduce: resolutions left out. nComponents: how many are decoded together at most.
-    Resolution(const Codestream& oStream, unsigned int nReduce, std::size_t nComponents);
+    Resolution(const Codestream& oStream, unsigned int nReduce, std::size_t nComponents,
+               std::uint64_t nBlockBytes = BLOCK_BYTES);
 
     unsigned int GetReduce() const { return mnReduce; }
     std::uint32_t GetWidth() const { return moPixels.mnX1 - moPixels.mnX0; }
@@ -41,7 +45,7 @@ public:
     std::uint32_t GetFirstY() const { return moPixels.mnY0; }
 
 private:
-    void ChooseBlocks(std::size_t nComponents);
+    void ChooseBlocks(std::size_t nComponents, std::uint64_t nBlockBytes);
     std::pair<std::uint32_t, std::uint32_t> FindSpan(std::uint32_t nImageBegin, std::uint32_t nImageEnd,
                                                      const std::set<std::uint32_t>& oSteps, std::uint32_t nBegin,
                                                      std::uint32_t nPixels) const;

@@ -39,8 +39,8 @@ support::ImageLayout TileSource::MakeLayout(const Catalogue& oCatalogue, const O
         oPlanes.push_back({bBits ? krv::gobs::DataType(krv::gobs::eDT_8U) : poPlane->moType, poPlane->GetChannels(),
                            poPlane->moType});
     }
-    return {(oCatalogue.mnWidth - 1) / oOrigin.mnLevel + 1, (oCatalogue.mnHeight - 1) / oOrigin.mnLevel + 1,
-            oCatalogue.mnBlockWidth, oCatalogue.mnBlockHeight, std::move(oPlanes)};
+    return {oOrigin.moSize.mnWidth, oOrigin.moSize.mnHeight, oCatalogue.mnBlockWidth, oCatalogue.mnBlockHeight,
+            std::move(oPlanes)};
 }
 
 TileSource::TileSource(const Catalogue& oCatalogue, Origin oOrigin)
@@ -207,6 +207,16 @@ void TileSource::WriteBlock(const support::BlockAddress& oBlock, const support::
     {
         ReadStored(oWork, oSpot, {0, 0, oSpot.moRect.mnWidth, oSpot.moRect.mnHeight}, pPixels, nHeldPitch);
     };
+    if (oWork.mpoPlane->moType.GetBits() < 8)
+    {
+        // What is held back reads as what is stored does: any byte but 0 is a bit that is set.
+        unsigned char* const pBits = moRows.Get(std::size_t{oPart.mnWidth} * oPart.mnHeight);
+        for (unsigned int nRow = 0; nRow < oPart.mnHeight; ++nRow)
+            for (unsigned int nAt = 0; nAt < oPart.mnWidth; ++nAt)
+                pBits[std::size_t{nRow} * oPart.mnWidth + nAt] = pSource[nRow * nPitch + nAt] != 0 ? 1 : 0;
+        pSource = pBits;
+        nPitch = oPart.mnWidth;
+    }
     oWork.moHeld.Write({oSpot.mnTile, oSpot.moRect},
                        {oSpot.moRect.mnX + oPart.mnX, oSpot.moRect.mnY + oPart.mnY, oPart.mnWidth, oPart.mnHeight},
                        pSource, nPitch, Read);

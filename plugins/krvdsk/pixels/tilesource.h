@@ -26,6 +26,7 @@ public:
         std::shared_ptr<StoreWriter> mpoWriter;
         std::vector<std::shared_ptr<Plane>> moPlanes;
         unsigned int mnLevel = 1;
+        ImageSize moSize; // of that
         std::function<void()> moBeforeWrite;
     };
 

@@ -70,22 +70,24 @@ void AddPlane(BytesWriter& oWriter, const Plane& oPlane)
     }
 }
 
-void AddNumbers(BytesWriter& oWriter, const std::vector<unsigned int>& oNumbers)
+void AddLevels(BytesWriter& oWriter, const std::map<unsigned int, ImageSize>& oLevels)
 {
-    oWriter.AddNumber(oNumbers.size(), 4);
-    for (const unsigned int nNumber : oNumbers)
-        oWriter.AddNumber(nNumber, 4);
+    oWriter.AddNumber(oLevels.size(), 4);
+    for (const auto& [nLevel, oSize] : oLevels)
+        for (const unsigned int nNumber : {nLevel, oSize.mnWidth, oSize.mnHeight})
+            oWriter.AddNumber(nNumber, 4);
 }
 
-std::vector<unsigned int> ReadLevels(BytesReader& oReader)
+std::map<unsigned int, ImageSize> ReadLevels(BytesReader& oReader, const ImageSize& oFull)
 {
-    std::vector<unsigned int> oLevels;
+    std::map<unsigned int, ImageSize> oLevels;
     for (std::uint32_t nLeft = oReader.ReadCount(); nLeft > 0; --nLeft)
     {
-        oLevels.push_back(oReader.ReadCount());
-        if (oLevels.back() < 2 || oLevels.back() > INT_MAX ||
-            (oLevels.size() > 1 && oLevels.back() <= oLevels[oLevels.size() - 2]))
-            oReader.Fail("its levels are not in order");
+        const unsigned int nLevel = oReader.ReadCount(), nWidth = oReader.ReadCount(), nHeight = oReader.ReadCount();
+        if (nLevel < 2 || (!oLevels.empty() && nLevel <= oLevels.rbegin()->first) || nWidth - 1 >= oFull.mnWidth ||
+            nHeight - 1 >= oFull.mnHeight)
+            oReader.Fail("level " + std::to_string(nLevel) + " is out of order");
+        oLevels[nLevel] = {nWidth, nHeight};
     }
     return oLevels;
 }
@@ -133,10 +135,14 @@ std::vector<unsigned char> Blob::Get(const StoreFile& oStore, const std::string&
     return oStore.Read(moEntry, what);
 }
 
-std::uint64_t Catalogue::CountTiles(unsigned int nLevel) const
+ImageSize Catalogue::GetUsualSize(unsigned int nLevel) const
 {
-    const std::uint64_t nWidth = (mnWidth - 1) / nLevel + 1, nHeight = (mnHeight - 1) / nLevel + 1;
-    return ((nWidth - 1) / mnBlockWidth + 1) * ((nHeight - 1) / mnBlockHeight + 1);
+    return {(moSize.mnWidth - 1) / nLevel + 1, (moSize.mnHeight - 1) / nLevel + 1};
+}
+
+std::uint64_t Catalogue::CountTiles(const ImageSize& oSize) const
+{
+    return (std::uint64_t{oSize.mnWidth - 1} / mnBlockWidth + 1) * ((oSize.mnHeight - 1) / mnBlockHeight + 1);
 }
 
 unsigned int Catalogue::CountChannels() const
@@ -149,18 +155,18 @@ unsigned int Catalogue::CountChannels() const
 
 std::string Catalogue::FindObstacle(const Plane& oPlane) const
 {
-    const std::uint64_t nRowBits = std::min(mnBlockWidth, mnWidth) * oPlane.GetPixelBits();
-    const std::uint64_t nBytes = (nRowBits + 7) / 8 * std::min(mnBlockHeight, mnHeight);
+    const std::uint64_t nRowBits = std::min(mnBlockWidth, moSize.mnWidth) * oPlane.GetPixelBits();
+    const std::uint64_t nBytes = (nRowBits + 7) / 8 * std::min(mnBlockHeight, moSize.mnHeight);
     if (nBytes > LARGEST_TILE)
         return "a tile would be of " + std::to_string(nBytes) + " bytes, more than " + std::to_string(LARGEST_TILE);
-    if (CountTiles(1) > MOST_TILES)
-        return "there would be " + std::to_string(CountTiles(1)) + " tiles";
+    if (CountTiles(moSize) > MOST_TILES)
+        return "there would be " + std::to_string(CountTiles(moSize)) + " tiles";
     return {};
 }
 
-std::shared_ptr<TileTable> Catalogue::MakeTable(unsigned int nLevel) const
+std::shared_ptr<TileTable> Catalogue::MakeTable(const ImageSize& oSize) const
 {
-    return std::make_shared<TileTable>(CountTiles(nLevel), Entry(), std::string());
+    return std::make_shared<TileTable>(CountTiles(oSize), Entry(), std::string());
 }
 
 std::shared_ptr<Plane> Catalogue::MakePlane(const krv::gobs::DataType& oType, unsigned int nChannels,
@@ -180,9 +186,9 @@ std::shared_ptr<Plane> Catalogue::MakePlane(const krv::gobs::DataType& oType, un
     const std::string obstacle = FindObstacle(*poPlane);
     if (!obstacle.empty())
         throw DataException(name + ": " + obstacle + "; choose other blocks (options BLOCKXSIZE, BLOCKYSIZE)", oPlace);
-    poPlane->moTables[1] = MakeTable(1);
-    for (const unsigned int nLevel : moLevels)
-        poPlane->moTables[nLevel] = MakeTable(nLevel);
+    poPlane->moTables[1] = MakeTable(moSize);
+    for (const auto& [nLevel, oSize] : moLevels)
+        poPlane->moTables[nLevel] = MakeTable(oSize);
     return poPlane;
 }
 
@@ -193,9 +199,9 @@ std::shared_ptr<Plane> Catalogue::MakeBitmapPlane() const
     poPlane->meCoding = meCoding;
     poPlane->mnCodingLevel = mnCodingLevel;
     poPlane->moThere.assign(1, true);
-    poPlane->moTables[1] = MakeTable(1);
-    for (const unsigned int nLevel : moBitmapLevels)
-        poPlane->moTables[nLevel] = MakeTable(nLevel);
+    poPlane->moTables[1] = MakeTable(moSize);
+    for (const auto& [nLevel, oSize] : moBitmapLevels)
+        poPlane->moTables[nLevel] = MakeTable(oSize);
     return poPlane;
 }
 
@@ -236,7 +242,8 @@ std::vector<unsigned char> Catalogue::Write() const
     AddItem(IMAGE,
             [this](BytesWriter& oItem)
             {
-                for (const unsigned int nNumber : {mnWidth, mnHeight, mnBlockWidth, mnBlockHeight, mnNextSegment})
+                for (const unsigned int nNumber :
+                     {moSize.mnWidth, moSize.mnHeight, mnBlockWidth, mnBlockHeight, mnNextSegment})
                     oItem.AddNumber(nNumber, 4);
                 for (const unsigned int nByte : {static_cast<unsigned int>(meCoding), unsigned{mnCodingLevel},
                                                  unsigned{mnPredictor}, unsigned{mbSeparate}})
@@ -245,8 +252,8 @@ std::vector<unsigned char> Catalogue::Write() const
     AddItem(LEVELS,
             [this](BytesWriter& oItem)
             {
-                AddNumbers(oItem, moLevels);
-                AddNumbers(oItem, moBitmapLevels);
+                AddLevels(oItem, moLevels);
+                AddLevels(oItem, moBitmapLevels);
             });
     if (!moLinkPath.empty())
         AddItem(LINK,
@@ -293,15 +300,15 @@ std::vector<unsigned char> Catalogue::Write() const
 
 void Catalogue::ReadImage(BytesReader oItem)
 {
-    for (unsigned int* pNumber : {&mnWidth, &mnHeight, &mnBlockWidth, &mnBlockHeight, &mnNextSegment})
+    for (unsigned int* pNumber : {&moSize.mnWidth, &moSize.mnHeight, &mnBlockWidth, &mnBlockHeight, &mnNextSegment})
         *pNumber = oItem.ReadCount();
     const auto nCoding = static_cast<std::uint8_t>(oItem.ReadNumber(1));
     mnCodingLevel = static_cast<std::uint8_t>(oItem.ReadNumber(1));
     mnPredictor = static_cast<std::uint8_t>(oItem.ReadNumber(1));
     mbSeparate = oItem.ReadNumber(1) != 0;
-    if (mnWidth - 1 >= INT_MAX || mnHeight - 1 >= INT_MAX || mnBlockWidth - 1 >= LARGEST_BLOCK_SIDE ||
+    if (moSize.mnWidth - 1 >= INT_MAX || moSize.mnHeight - 1 >= INT_MAX || mnBlockWidth - 1 >= LARGEST_BLOCK_SIDE ||
         mnBlockHeight - 1 >= LARGEST_BLOCK_SIDE || nCoding >= std::size(CODING_NAMES) || mnPredictor > 3)
-        oItem.Fail("an image of " + std::to_string(mnWidth) + " x " + std::to_string(mnHeight) +
+        oItem.Fail("an image of " + std::to_string(moSize.mnWidth) + " x " + std::to_string(moSize.mnHeight) +
                    " pixels in tiles of " + std::to_string(mnBlockWidth) + " x " + std::to_string(mnBlockHeight) +
                    " and coding " + std::to_string(nCoding) + " cannot be");
     meCoding = static_cast<Coding>(nCoding);
@@ -327,20 +334,19 @@ std::shared_ptr<Plane> Catalogue::ReadPlane(BytesReader& oItem, bool bBitmap) co
         poPlane->moThere.push_back(nThere != 0);
     if (poPlane->GetChannels() == 0 || (bBitmap && poPlane->moThere.size() != 1))
         oItem.Fail("a plane has no channels, or too many");
-    std::vector<unsigned int> oLevels = bBitmap ? moBitmapLevels : moLevels;
-    oLevels.insert(oLevels.begin(), 1);
-    const std::uint32_t nTables = oItem.ReadCount();
-    for (std::uint32_t nTable = 0; nTable < nTables; ++nTable)
-    {
-        if (nTable >= oLevels.size() || oItem.ReadCount() != oLevels[nTable])
-            oItem.Fail("the levels of a plane are not those of the file");
-        const Entry oTop = oItem.ReadEntry();
-        poPlane->moTables[oLevels[nTable]] =
-            std::make_shared<TileTable>(CountTiles(oLevels[nTable]), oTop, std::string());
-    }
     const std::string obstacle = FindObstacle(*poPlane);
-    if (nTables != oLevels.size() || !obstacle.empty())
-        oItem.Fail(obstacle.empty() ? "the levels of a plane are not those of the file" : obstacle);
+    if (!obstacle.empty())
+        oItem.Fail(obstacle);
+    std::map<unsigned int, ImageSize> oImages = bBitmap ? moBitmapLevels : moLevels;
+    oImages[1] = moSize;
+    if (oItem.ReadCount() != oImages.size())
+        oItem.Fail("the levels of a plane are not those of the file");
+    for (const auto& [nLevel, oSize] : oImages)
+    {
+        if (oItem.ReadCount() != nLevel)
+            oItem.Fail("the levels of a plane are not those of the file");
+        poPlane->moTables[nLevel] = std::make_shared<TileTable>(CountTiles(oSize), oItem.ReadEntry(), std::string());
+    }
     return poPlane;
 }
 
@@ -386,14 +392,14 @@ Catalogue Catalogue::Read(const StoreFile& oStore, const std::vector<unsigned ch
     {
         std::string name;
         BytesReader oItem = oAll.ReadItem(name);
-        if ((name == IMAGE) != (oCatalogue.mnWidth == 0))
+        if ((name == IMAGE) != (oCatalogue.moSize.mnWidth == 0))
             oAll.Fail("it does not begin with the size of the image");
         if (name == IMAGE)
             oCatalogue.ReadImage(oItem);
         else if (name == LEVELS)
         {
-            oCatalogue.moLevels = ReadLevels(oItem);
-            oCatalogue.moBitmapLevels = ReadLevels(oItem);
+            oCatalogue.moLevels = ReadLevels(oItem, oCatalogue.moSize);
+            oCatalogue.moBitmapLevels = ReadLevels(oItem, oCatalogue.moSize);
         }
         else if (name == PLANE)
         {
@@ -422,7 +428,7 @@ Catalogue Catalogue::Read(const StoreFile& oStore, const std::vector<unsigned ch
         else if (name[0] >= 'A' && name[0] <= 'Z')
             oAll.Fail("it holds an item \"" + name + "\", which this program does not know");
     }
-    if (oCatalogue.mnWidth == 0 || nChannels > MOST_CHANNELS)
+    if (oCatalogue.moSize.mnWidth == 0 || nChannels > MOST_CHANNELS)
         oAll.Fail("it names no image, or too many channels");
     oCatalogue.Describe();
     return oCatalogue;

@@ -90,6 +90,13 @@ struct Segment
     std::string Describe(unsigned int nNumber) const { return moKind + " " + std::to_string(nNumber); }
 };
 
+// Of an image or a level, in pixels.
+struct ImageSize
+{
+    unsigned int mnWidth = 0;
+    unsigned int mnHeight = 0;
+};
+
 // What a file holds, without pixels and the bytes of segments: its directory, in memory. The record of metadata is read
 // apart.
 struct Catalogue
@@ -101,8 +108,7 @@ struct Catalogue
     static constexpr unsigned int MOST_CHANNELS = 1u << 20;
     static constexpr std::uint64_t MOST_TILES = std::uint64_t{1} << 40;
 
-    unsigned int mnWidth = 0;
-    unsigned int mnHeight = 0;
+    ImageSize moSize;
     unsigned int mnBlockWidth = 256;
     unsigned int mnBlockHeight = 256;
     // How planes to come are stored.
@@ -115,9 +121,9 @@ struct Catalogue
     std::string moLinkPath; // of that file, from the folder of this one; empty: there is none
     std::vector<Link::Channel> moLinked;
     std::vector<std::shared_ptr<Plane>> moPlanes;
-    std::vector<unsigned int> moLevels; // ascending, from 2 on
+    std::map<unsigned int, ImageSize> moLevels; // from 2 on
     std::map<unsigned int, Segment> moSegments;
-    std::vector<unsigned int> moBitmapLevels;
+    std::map<unsigned int, ImageSize> moBitmapLevels;
     unsigned int mnNextSegment = 1;
     bool mbPlaced = false; // has a geocoding
     krv::ogc::cs::GeocodingInfo moGeocoding;
@@ -129,9 +135,11 @@ struct Catalogue
     std::vector<unsigned char> Write() const;
 
     unsigned int CountChannels() const;
-    std::uint64_t CountTiles(unsigned int nLevel) const;
+    // Of a level as new ones are made; of the image, 1.
+    ImageSize GetUsualSize(unsigned int nLevel) const;
+    std::uint64_t CountTiles(const ImageSize& oSize) const;
     // A table of nothing.
-    std::shared_ptr<TileTable> MakeTable(unsigned int nLevel) const;
+    std::shared_ptr<TileTable> MakeTable(const ImageSize& oSize) const;
     // Of a type, as the file stores new ones, with tables for all levels. Throws krv::DataException for tiles that are
     // too large or too many.
     std::shared_ptr<Plane> MakePlane(const krv::gobs::DataType& oType, unsigned int nChannels, const std::string& name,

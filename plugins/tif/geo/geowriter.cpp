@@ -1,15 +1,10 @@
 #include "plugins/tif/geo/geowriter.h"
 
-#include "plugins/tif/geo/keyrules.h"
-#include "toolkit/exceptions/exceptions.h"
-#include "toolkit/ogc/cs/crsparts.h"
+#include <algorithm>
+#include <bit>
+#include <cstdint>
 
-#include <cmath>
-#include <optional>
-#include <string>
-
-#include <geokeys.h>
-#include <geovalues.h>
+#include <tiff.h>
 
 namespace krv::plugins::tif
 {
@@ -17,248 +12,92 @@ namespace krv::plugins::tif
 namespace
 {
 
-using namespace krv::ogc::cs;
-
-constexpr std::uint16_t TAG_SCALE = 33550;
-constexpr std::uint16_t TAG_TIE_POINTS = 33922;
-constexpr std::uint16_t TAG_MATRIX = 34264;
-constexpr double HALF_PIXEL = 0.5;
-constexpr std::uint16_t USER_DEFINED = 32767;
-constexpr std::uint16_t METRE = 9001;
-constexpr std::uint16_t DEGREE = 9102;
-constexpr double DEGREE_SIZE = M_PI / 180.0;
-constexpr double UNIT_ROUNDING = 1e-12;
-constexpr std::size_t LONGEST_TEXT = 60000;
-
-std::uint16_t ToCode(int nCode)
+std::vector<double> GetDoubles(const TagList& oTags, std::uint16_t nTag)
 {
-    return nCode > 0 && nCode < USER_DEFINED ? static_cast<std::uint16_t>(nCode) : std::uint16_t{0};
+    std::vector<double> oDoubles;
+    const Tag* pTag = oTags.Find(nTag);
+    for (std::size_t nAt = 0; pTag != nullptr && pTag->mnType == TIFF_DOUBLE && nAt + 8 <= pTag->moBytes.size();
+         nAt += 8)
+        oDoubles.push_back(std::bit_cast<double>(ReadNumber(pTag->moBytes.data() + nAt, 8, oTags.IsBigEndian())));
+    return oDoubles;
 }
 
-void SetModel(GeoKeyList& oKeys, const ICRS& oCRS)
+void SetDoubles(TagList& oTags, std::uint16_t nTag, const std::vector<double>& oValues)
 {
-    const int nModel = oCRS.IsProjected()    ? ModelTypeProjected
-                       : oCRS.IsGeographic() ? ModelTypeGeographic
-                                             : ModelTypeGeocentric;
-    oKeys.Set(GTModelTypeGeoKey, static_cast<std::uint16_t>(nModel));
-}
-
-void SetUnits(GeoKeyList& oKeys, const ICRS& oCRS)
-{
-    if (oCRS.IsProjected() && oCRS.GetUnitFactor() == 1.0)
-        oKeys.Set(ProjLinearUnitsGeoKey, METRE);
-    else if (oCRS.IsProjected())
-    {
-        oKeys.Set(ProjLinearUnitsGeoKey, USER_DEFINED);
-        oKeys.Set(ProjLinearUnitSizeGeoKey, std::vector<double>{oCRS.GetUnitFactor()});
-    }
-    else if (oCRS.IsGeographic() && std::abs(oCRS.GetUnitFactor() / DEGREE_SIZE - 1.0) < UNIT_ROUNDING)
-        oKeys.Set(GeogAngularUnitsGeoKey, DEGREE);
-}
-
-void SetHeights(GeoKeyList& oKeys, const CRSParts& oParts)
-{
-    const std::uint16_t nCode = ToCode(oParts.verticalCode);
-    if (nCode != 0)
-        oKeys.Set(VerticalCSTypeGeoKey, nCode);
-}
-
-std::optional<GeoKeyList> ByCode(const ICRS& oCRS, const CRSParts& oParts)
-{
-    const std::uint16_t nCode = ToCode(oCRS.GetEPSG());
-    if (nCode == 0)
-        return std::nullopt;
-    GeoKeyList oKeys;
-    SetModel(oKeys, oCRS);
-    oKeys.Set(GTCitationGeoKey, oCRS.GetName());
-    oKeys.Set(oCRS.IsProjected() ? ProjectedCSTypeGeoKey : GeographicTypeGeoKey, nCode);
-    SetUnits(oKeys, oCRS);
-    SetHeights(oKeys, oParts);
-    return oKeys;
-}
-
-// The geographic system below: by its code, else by datum and ellipsoid. Citations name the parts.
-void SetBase(GeoKeyList& oKeys, const GeodeticParts& oParts)
-{
-    const std::uint16_t nBase = ToCode(oParts.code);
-    if (nBase != 0)
-        return oKeys.Set(GeographicTypeGeoKey, nBase);
-    const DatumParts& oDatum = oParts.datum;
-    const EllipsoidParts& oEllipsoid = oDatum.ellipsoid;
-    oKeys.Set(GeographicTypeGeoKey, USER_DEFINED);
-    oKeys.Set(GeogCitationGeoKey,
-              "GCS Name = " + oParts.name + "|Datum = " + oDatum.name + "|Ellipsoid = " + oEllipsoid.name);
-    const std::uint16_t nDatum = ToCode(oDatum.code);
-    oKeys.Set(GeogGeodeticDatumGeoKey, nDatum != 0 ? nDatum : USER_DEFINED);
-    oKeys.Set(GeogAngularUnitsGeoKey, DEGREE);
-    if (nDatum != 0)
-        return;
-    oKeys.Set(GeogEllipsoidGeoKey, USER_DEFINED);
-    oKeys.Set(GeogSemiMajorAxisGeoKey, std::vector<double>{oEllipsoid.semiMajorAxis});
-    if (oEllipsoid.inverseFlattening != 0.0)
-        oKeys.Set(GeogInvFlatteningGeoKey, std::vector<double>{oEllipsoid.inverseFlattening});
+    if (oValues.empty())
+        oTags.Remove(nTag);
     else
-        oKeys.Set(GeogSemiMinorAxisGeoKey, std::vector<double>{oEllipsoid.semiMinorAxis});
-}
-
-std::optional<GeoKeyList> ByParts(const ICRS& oCRS, const CRSParts& oParts)
-{
-    if (!oCRS.IsProjected() && !oCRS.IsGeographic())
-        return std::nullopt;
-    GeoKeyList oKeys;
-    SetModel(oKeys, oCRS);
-    oKeys.Set(GTCitationGeoKey, oCRS.GetName());
-    SetBase(oKeys, oParts.horizontal.base);
-    if (!oParts.horizontal.base.shift.empty())
-        oKeys.Set(GeogTOWGS84GeoKey, oParts.horizontal.base.shift);
-    SetUnits(oKeys, oCRS);
-    SetHeights(oKeys, oParts);
-    if (!oCRS.IsProjected())
-        return oKeys;
-    const ProjectedParts& oMap = oParts.horizontal;
-    const std::uint16_t nMethod = oMap.method != nullptr ? FindMethodKey(*oMap.method) : std::uint16_t{0};
-    if (nMethod == 0)
-        return std::nullopt;
-    for (std::size_t nAt = 0; nAt < oMap.values.size(); ++nAt)
-        oKeys.Set(FindParameterKeys(nMethod, oMap.method->parameters[nAt]->code).keys.front(),
-                  std::vector<double>{oMap.values[nAt]});
-    oKeys.Set(GeogAngularUnitsGeoKey, DEGREE);
-    oKeys.Set(ProjectedCSTypeGeoKey, USER_DEFINED);
-    oKeys.Set(PCSCitationGeoKey, oCRS.GetName());
-    oKeys.Set(ProjectionGeoKey, USER_DEFINED);
-    oKeys.Set(ProjCoordTransGeoKey, nMethod);
-    return oKeys;
-}
-
-std::optional<GeoKeyList> ByText(const ICRS& oCRS, const std::string& definition)
-{
-    if (definition.size() > LONGEST_TEXT || definition.find('|') != std::string::npos)
-        return std::nullopt;
-    GeoKeyList oKeys;
-    SetModel(oKeys, oCRS);
-    const bool bProjected = oCRS.IsProjected();
-    oKeys.Set(bProjected ? ProjectedCSTypeGeoKey : GeographicTypeGeoKey, USER_DEFINED);
-    oKeys.Set(bProjected ? PCSCitationGeoKey : GTCitationGeoKey, std::string(DEFINITION_PREFIX) + definition);
-    return oKeys;
-}
-
-// Geographic keys that may express a reference system, the most common form first: its code in the EPSG database, its
-// projection and ellipsoid as values, its definition as a text. Not each of them says the same as the system: whoever
-// stores them reads them back.
-std::vector<GeoKeyList> ProposeKeys(const ICRS& oCRS)
-{
-    std::vector<GeoKeyList> oProposals;
-    const auto Add = [&oProposals](std::optional<GeoKeyList> oKeys)
-    {
-        if (oKeys)
-            oProposals.push_back(std::move(*oKeys));
-    };
-    const CRSParts oParts = DescribeCRS(oCRS);
-    Add(ByCode(oCRS, oParts));
-    Add(ByParts(oCRS, oParts));
-    try
-    {
-        Add(ByText(oCRS, oCRS.GetWKT1()));
-    }
-    catch (const krv::DataException&)
-    {
-        // Not every system has that form.
-    }
-    Add(ByText(oCRS, oCRS.GetWKT()));
-    Add(ByText(oCRS, oCRS.GetPROJJSON()));
-    return oProposals;
+        oTags.SetDoubles(nTag, oValues);
 }
 
 } // namespace
 
-bool GeoWriter::IsPoint() const
+support::GeoTags GeoWriter::GetTags() const
 {
-    return GeoKeyList::From(mpoPage->moTags).GetCode(GTRasterTypeGeoKey, RasterPixelIsArea) == RasterPixelIsPoint;
+    const TagList& oTags = mpoPage->moTags;
+    const std::vector<std::uint64_t> oNumbers = oTags.GetNumbers(support::TAG_GEO_KEYS);
+    std::vector<std::uint16_t> oKeys(oNumbers.size());
+    std::transform(oNumbers.begin(), oNumbers.end(), oKeys.begin(),
+                   [](std::uint64_t nNumber) { return static_cast<std::uint16_t>(nNumber); });
+    return {GetDoubles(oTags, support::TAG_GEO_SCALE),   GetDoubles(oTags, support::TAG_GEO_TIE_POINTS),
+            GetDoubles(oTags, support::TAG_GEO_MATRIX),  oKeys,
+            GetDoubles(oTags, support::TAG_GEO_DOUBLES), oTags.GetText(support::TAG_GEO_TEXTS)};
 }
 
-void GeoWriter::SetGeocoding(const GeocodingInfo& oInfo)
+void GeoWriter::StorePlace(const support::GeoTags& oTags)
 {
-    TagList& oTags = mpoPage->moTags;
-    oTags.Remove(TAG_SCALE);
-    oTags.Remove(TAG_TIE_POINTS);
-    oTags.Remove(TAG_MATRIX);
-    if (oInfo.IsIdentity())
-        return;
-    double nX = oInfo.GetXOffset();
-    double nY = oInfo.GetYOffset();
-    if (IsPoint())
-        oInfo.RasterToMap(HALF_PIXEL, HALF_PIXEL, nX, nY);
-    if (!oInfo.IsRotated() && oInfo.GetXPerColumn() > 0 && oInfo.GetYPerRow() < 0)
-    {
-        oTags.SetDoubles(TAG_SCALE, {oInfo.GetXPerColumn(), -oInfo.GetYPerRow(), 0.0});
-        return oTags.SetDoubles(TAG_TIE_POINTS, {0.0, 0.0, 0.0, nX, nY, 0.0});
-    }
-    oTags.SetDoubles(TAG_MATRIX, {oInfo.GetXPerColumn(), oInfo.GetXPerRow(), 0.0, nX, oInfo.GetYPerColumn(),
-                                  oInfo.GetYPerRow(), 0.0, nY, 0.0, 0.0, 0.0, 0.0, 0.0, 0.0, 0.0, 1.0});
+    SetDoubles(mpoPage->moTags, support::TAG_GEO_SCALE, oTags.moScale);
+    SetDoubles(mpoPage->moTags, support::TAG_GEO_TIE_POINTS, oTags.moTiePoints);
+    SetDoubles(mpoPage->moTags, support::TAG_GEO_MATRIX, oTags.moMatrix);
+}
+
+void GeoWriter::StoreKeys(const support::GeoTags& oTags)
+{
+    TagList& oStored = mpoPage->moTags;
+    if (oTags.moKeys.empty())
+        oStored.Remove(support::TAG_GEO_KEYS);
+    else
+        oStored.SetNumbers(support::TAG_GEO_KEYS, TIFF_SHORT,
+                           std::vector<std::uint64_t>(oTags.moKeys.begin(), oTags.moKeys.end()));
+    SetDoubles(oStored, support::TAG_GEO_DOUBLES, oTags.moDoubles);
+    oStored.SetText(support::TAG_GEO_TEXTS, oTags.moTexts);
+}
+
+void GeoWriter::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
+{
+    support::GeoTags oTags = GetTags();
+    support::SetGeocoding(oTags, oInfo);
+    StorePlace(oTags);
 }
 
 void GeoWriter::SetRasterType(bool bPoint)
 {
-    GeocodingInfo oInfo;
-    const bool bGeocoded = ReadGeocoding(moEditor.OpenPage(mpoPage)->GetTiff(), oInfo);
-    const bool bShift = bGeocoded && bPoint != IsPoint();
-    GeoKeyList oKeys = GeoKeyList::From(mpoPage->moTags);
-    oKeys.Set(GTRasterTypeGeoKey, static_cast<std::uint16_t>(bPoint ? RasterPixelIsPoint : RasterPixelIsArea));
-    oKeys.Store(mpoPage->moTags);
-    if (bShift)
-        SetGeocoding(oInfo);
+    support::GeoTags oTags = GetTags();
+    support::SetRasterType(oTags, bPoint);
+    StoreKeys(oTags);
+    StorePlace(oTags);
 }
 
-// It goes only where no other key needs it.
 void GeoWriter::RemoveRasterType()
 {
-    if (IsPoint())
-        SetRasterType(false);
-    GeoKeyList oKeys = GeoKeyList::From(mpoPage->moTags);
-    oKeys.Remove(GTRasterTypeGeoKey);
-    if (oKeys.IsEmpty())
-        oKeys.Store(mpoPage->moTags);
+    support::GeoTags oTags = GetTags();
+    support::RemoveRasterType(oTags);
+    StoreKeys(oTags);
+    StorePlace(oTags);
 }
 
 void GeoWriter::SetTiePoints(const std::vector<TiePoint>& oPoints)
 {
-    const double nShift = IsPoint() ? HALF_PIXEL : 0.0;
-    std::vector<double> oValues;
-    for (const TiePoint& oPoint : oPoints)
-        oValues.insert(oValues.end(), {oPoint.column - nShift, oPoint.row - nShift, 0.0, oPoint.x, oPoint.y, oPoint.z});
-    mpoPage->moTags.Remove(TAG_TIE_POINTS);
-    if (!oValues.empty())
-        mpoPage->moTags.SetDoubles(TAG_TIE_POINTS, oValues);
-}
-
-bool GeoWriter::Try(const GeoKeyList& oKeys, const krv::ogc::cs::ICRS& oCRS)
-{
-    oKeys.Store(mpoPage->moTags);
-    try
-    {
-        const std::unique_ptr<krv::ogc::cs::ICRS> poRead = ReadCRS(moEditor.OpenPage(mpoPage)->GetTiff());
-        return poRead && poRead->IsEquivalent(oCRS) && poRead->HasVertical() == oCRS.HasVertical();
-    }
-    catch (const krv::DataException&)
-    {
-        return false;
-    }
+    support::GeoTags oTags = GetTags();
+    support::SetTiePoints(oTags, oPoints);
+    StorePlace(oTags);
 }
 
 void GeoWriter::SetCRS(const krv::ogc::cs::ICRS& oCRS, const Place& oPlace)
 {
-    const GeoKeyList oOld = GeoKeyList::From(mpoPage->moTags);
-    const std::uint16_t nRasterType = oOld.GetCode(GTRasterTypeGeoKey, RasterPixelIsArea);
-    for (GeoKeyList& oKeys : ProposeKeys(oCRS))
-    {
-        oKeys.Set(GTRasterTypeGeoKey, nRasterType);
-        if (Try(oKeys, oCRS))
-            return;
-    }
-    oOld.Store(mpoPage->moTags);
-    throw krv::DataException(moEditor.GetFileName() + ": the reference system \"" + oCRS.GetName() +
-                                 "\" cannot be expressed by geographic keys",
-                             oPlace);
+    support::GeoTags oTags = GetTags();
+    support::SetCRS(oTags, oCRS, moEditor.GetFileName(), oPlace);
+    StoreKeys(oTags);
 }
 
 } // namespace krv::plugins::tif

@@ -238,6 +238,19 @@ void CompareLevels(const Facts& oFacts, Jp2Dataset& oDataset)
     }
 }
 
+void CompareGeography(const Facts& oFacts, const Jp2Dataset& oDataset)
+{
+    const std::unique_ptr<krv::ogc::cs::ICRS> poCRS(oDataset.ReadCRS());
+    EXPECT_EQ(poCRS ? "EPSG:" + std::to_string(poCRS->GetEPSG()) : "-", oFacts["crs"]);
+    const krv::ogc::cs::GeocodingInfo& oInfo = oDataset.GetGeocoding();
+    const std::vector<double> oTerms = oFacts.Numbers("geotransform");
+    if (oFacts["geo_source"].starts_with("world file"))
+        return;
+    ASSERT_EQ(oInfo.IsIdentity(), oTerms.empty());
+    for (std::size_t nAt = 0; nAt < oTerms.size(); ++nAt)
+        EXPECT_NEAR(oInfo.GetTerms()[nAt], oTerms[nAt], 1e-9 * std::abs(oTerms[nAt])) << nAt;
+}
+
 // Those without facts about pixels cannot be decoded by anybody.
 void CompareFailure(const Facts& oFacts, Jp2Builder& oBuilder)
 {
@@ -284,6 +297,7 @@ TEST(Jp2Facts, PixelsAndLevelsOfRealFiles)
             auto& oDataset = dynamic_cast<Jp2Dataset&>(*poDataset);
             CompareImage(oFacts, oDataset);
             CompareLevels(oFacts, oDataset);
+            CompareGeography(oFacts, oDataset);
         }
         catch (const std::exception& oException)
         {

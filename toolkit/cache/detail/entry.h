@@ -14,6 +14,7 @@ namespace krv::cache::detail
 struct OwnerState
 {
     std::uint64_t mnNumber = 0;
+    TileLayer meLayer = TileLayer::eBlocks;
     bool mbShared = false;
     std::string moIdentity;
     std::atomic<std::uint64_t> mnTiles{0}; // that a look can find

@@ -14,8 +14,20 @@ namespace
 // Stamps of what goes only when nothing else does come after all others.
 constexpr std::uint64_t LATER = std::uint64_t{1} << 62;
 
-// Tiles that the thread is making. One that makes some waits for no other thread.
-thread_local unsigned int tnMaking = 0;
+// Tiles that the thread is making, by their layer.
+thread_local std::array<unsigned int, 2> taMaking{};
+
+unsigned int& CountMaking(TileLayer eLayer)
+{
+    return taMaking[static_cast<std::size_t>(eLayer)];
+}
+
+// Who makes a tile of some layer waits for lower ones only.
+bool MayWait(TileLayer eLayer)
+{
+    return CountMaking(TileLayer::eBlocks) == 0 &&
+           (eLayer == TileLayer::eBlocks || CountMaking(TileLayer::eDerived) == 0);
+}
 
 void Widen(TileFrame& oFrame, const TileFrame& oOther)
 {
@@ -66,20 +78,21 @@ void Store::Clear()
     RemoveIf([](const Entry& oEntry) { return oEntry.mnReferences.load(std::memory_order_acquire) == 1; });
 }
 
-std::shared_ptr<OwnerState> Store::AddOwner()
+std::shared_ptr<OwnerState> Store::AddOwner(TileLayer eLayer)
 {
     const auto poOwner = std::make_shared<OwnerState>();
+    poOwner->meLayer = eLayer;
     poOwner->mnNumber = mnOwners.fetch_add(1, std::memory_order_relaxed);
     return poOwner;
 }
 
-std::shared_ptr<OwnerState> Store::AddOwner(const std::string& identity)
+std::shared_ptr<OwnerState> Store::AddOwner(const std::string& identity, TileLayer eLayer)
 {
     const std::lock_guard oLock(moMutex);
     auto& [poOwner, nSharing] = moOwners[identity];
     if (!poOwner)
     {
-        poOwner = AddOwner();
+        poOwner = AddOwner(eLayer);
         poOwner->mbShared = true;
         poOwner->moIdentity = identity;
     }
@@ -199,7 +212,7 @@ Store::Result Store::Search(const std::shared_ptr<OwnerState>& poOwner, const Ti
     {
         const bool bSame = poEntry->moShape == oRequest.moShape;
         const bool bComing = poEntry->meState == Entry::eComing;
-        if (bSame && bComing && bWait && tnMaking == 0)
+        if (bSame && bComing && bWait && MayWait(poOwner->meLayer))
         {
             if (Entry* const poMade = Await(*poEntry, oShard, oLock))
                 return {poMade, nullptr};
@@ -230,7 +243,7 @@ Store::Result Store::Search(const std::shared_ptr<OwnerState>& poOwner, const Ti
     ++oShard.mnMisses;
     oLock.unlock();
     mnClock.fetch_add(1, std::memory_order_relaxed);
-    ++tnMaking;
+    ++CountMaking(poOwner->meLayer);
     try
     {
         GiveMemory(*poNew);
@@ -246,7 +259,7 @@ Store::Result Store::Search(const std::shared_ptr<OwnerState>& poOwner, const Ti
 
 void Store::Finish(Entry& oEntry, Entry::State eState, std::exception_ptr oFailure) noexcept
 {
-    --tnMaking;
+    --CountMaking(oEntry.mpoOwner->meLayer);
     Shard& oShard = GetShard({oEntry.mpoOwner->mnNumber, oEntry.moName});
     {
         const std::lock_guard oLock(oShard.moMutex);

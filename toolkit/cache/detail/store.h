@@ -24,8 +24,8 @@ public:
     void ResetStatistics();
     void Clear();
 
-    std::shared_ptr<OwnerState> AddOwner();
-    std::shared_ptr<OwnerState> AddOwner(const std::string& identity);
+    std::shared_ptr<OwnerState> AddOwner(TileLayer eLayer);
+    std::shared_ptr<OwnerState> AddOwner(const std::string& identity, TileLayer eLayer);
     void RemoveOwner(const std::shared_ptr<OwnerState>& poOwner);
     void DropAll(const std::shared_ptr<OwnerState>& poOwner);
     void Drop(const OwnerState& oOwner, const TileName& oName);

@@ -6,7 +6,7 @@
 #include <cstdint>
 #include <string_view>
 
-namespace krv::plugins::tif
+namespace krv::plugins::support
 {
 
 // What geographic keys of reference systems mean, for those who read them and those who write them.
@@ -34,4 +34,4 @@ const krv::ogc::cs::ProjectionMethod* FindMethod(std::uint16_t nMethod, bool bSe
 // The value of key 3075 of a method; 0 when there is none.
 std::uint16_t FindMethodKey(const krv::ogc::cs::ProjectionMethod& oMethod);
 
-} // namespace krv::plugins::tif
+} // namespace krv::plugins::support

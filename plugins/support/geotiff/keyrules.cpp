@@ -1,4 +1,4 @@
-#include "plugins/tif/geo/keyrules.h"
+#include "plugins/support/geotiff/keyrules.h"
 
 #include <algorithm>
 #include <iterator>
@@ -6,7 +6,7 @@
 #include <geotiff.h>
 #include <geovalues.h>
 
-namespace krv::plugins::tif
+namespace krv::plugins::support
 {
 namespace
 {
@@ -113,4 +113,4 @@ std::uint16_t FindMethodKey(const ProjectionMethod& oMethod)
     return pFound == std::end(METHODS) ? std::uint16_t{0} : pFound->key;
 }
 
-} // namespace krv::plugins::tif
+} // namespace krv::plugins::support

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "plugins/tif/writing/taglist.h"
+#include "plugins/support/geotiff/geotags.h"
 
 #include <cstdint>
 #include <map>
@@ -9,9 +9,7 @@
 #include <variant>
 #include <vector>
 
-#include <tiffio.h>
-
-namespace krv::plugins::tif
+namespace krv::plugins::support
 {
 
 // The geographic keys of a page as values: a code, numbers or a text each.
@@ -20,10 +18,9 @@ class GeoKeyList
 public:
     using Value = std::variant<std::uint16_t, std::vector<double>, std::string>;
 
-    // The keys of a page. What is damaged in them is left out, and the first of it told in pDamage; texts that are not
-    // there, and keys whose values stand in unknown places, are no damage.
-    static GeoKeyList From(const TagList& oTags);
-    static GeoKeyList From(TIFF* poTiff, std::string* pDamage = nullptr);
+    // The keys of a directory. What is damaged in them is left out, and the first of it told in pDamage; texts that are
+    // not there, and keys whose values stand in unknown places, are no damage.
+    static GeoKeyList From(const GeoTags& oTags, std::string* pDamage = nullptr);
 
     void Set(std::uint16_t nKey, Value oValue) { moKeys[nKey] = std::move(oValue); }
     void Remove(std::uint16_t nKey) { moKeys.erase(nKey); }
@@ -40,15 +37,13 @@ public:
     std::string GetText(std::uint16_t nKey) const;
 
     // Replaces the three tags of the keys; removes them when there are no keys.
-    void Store(TagList& oTags) const;
+    void Store(GeoTags& oTags) const;
 
 private:
-    static GeoKeyList Parse(const std::vector<std::uint16_t>& oShorts, const std::vector<double>& oDoubles,
-                            const std::string& texts, std::string* pDamage);
     template <class Kind>
     const Kind* Find(std::uint16_t nKey) const;
 
     std::map<std::uint16_t, Value> moKeys;
 };
 
-} // namespace krv::plugins::tif
+} // namespace krv::plugins::support

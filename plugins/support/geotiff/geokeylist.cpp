@@ -1,59 +1,32 @@
-#include "plugins/tif/geo/geokeylist.h"
+#include "plugins/support/geotiff/geokeylist.h"
 
-#include "plugins/tif/reading/tiffvalues.h"
 #include "toolkit/xml/xmlutil.h"
 
 #include <algorithm>
-#include <bit>
 #include <string_view>
 
 #include <geotiff.h>
 #include <geovalues.h>
 
-namespace krv::plugins::tif
+namespace krv::plugins::support
 {
 
 namespace
 {
 
-constexpr std::uint16_t TAG_KEYS = 34735;
-constexpr std::uint16_t TAG_DOUBLES = 34736;
-constexpr std::uint16_t TAG_TEXTS = 34737;
 constexpr std::uint16_t VERSION = 1;
 // Of a key: itself, the tag of its values or 0, their number, their place or the value.
 constexpr std::size_t ENTRY_VALUES = 4;
 // Texts are stored one behind the other, each with this at its end.
 constexpr char TEXT_END = '|';
 
-std::vector<double> GetDoubles(const TagList& oTags)
-{
-    std::vector<double> oDoubles;
-    const Tag* pTag = oTags.Find(TAG_DOUBLES);
-    for (std::size_t nAt = 0; pTag != nullptr && pTag->mnType == TIFF_DOUBLE && nAt + 8 <= pTag->moBytes.size();
-         nAt += 8)
-        oDoubles.push_back(std::bit_cast<double>(ReadNumber(pTag->moBytes.data() + nAt, 8, oTags.IsBigEndian())));
-    return oDoubles;
-}
-
 } // namespace
 
-GeoKeyList GeoKeyList::From(const TagList& oTags)
+GeoKeyList GeoKeyList::From(const GeoTags& oTags, std::string* pDamage)
 {
-    const std::vector<std::uint64_t> oNumbers = oTags.GetNumbers(TAG_KEYS);
-    std::vector<std::uint16_t> oShorts(oNumbers.size());
-    std::transform(oNumbers.begin(), oNumbers.end(), oShorts.begin(),
-                   [](std::uint64_t nNumber) { return static_cast<std::uint16_t>(nNumber); });
-    return Parse(oShorts, GetDoubles(oTags), oTags.GetText(TAG_TEXTS), nullptr);
-}
-
-GeoKeyList GeoKeyList::From(TIFF* poTiff, std::string* pDamage)
-{
-    return Parse(ReadShorts(poTiff, TAG_KEYS), ReadDoubles(poTiff, TAG_DOUBLES), ReadText(poTiff, TAG_TEXTS), pDamage);
-}
-
-GeoKeyList GeoKeyList::Parse(const std::vector<std::uint16_t>& oShorts, const std::vector<double>& oDoubles,
-                             const std::string& texts, std::string* pDamage)
-{
+    const std::vector<std::uint16_t>& oShorts = oTags.moKeys;
+    const std::vector<double>& oDoubles = oTags.moDoubles;
+    const std::string& texts = oTags.moTexts;
     GeoKeyList oList;
     const auto Expect = [pDamage](bool bSound, const std::string& damage)
     {
@@ -84,15 +57,15 @@ GeoKeyList GeoKeyList::Parse(const std::vector<std::uint16_t>& oShorts, const st
             if (Expect(nCount == 1, key + " has " + std::to_string(nCount) + " values in the place of one"))
                 oList.Set(nKey, pEntry[3]);
             break;
-        case TAG_DOUBLES:
+        case TAG_GEO_DOUBLES:
             if (Expect(Holds(oDoubles.size()), key + " points outside the list of numbers"))
                 oList.Set(nKey, std::vector<double>(oDoubles.data() + nValue, oDoubles.data() + nValue + nCount));
             break;
-        case TAG_KEYS:
+        case TAG_GEO_KEYS:
             if (Expect(Holds(oShorts.size()), key + " points outside the directory"))
                 oList.Set(nKey, oShorts[nValue]);
             break;
-        case TAG_TEXTS:
+        case TAG_GEO_TEXTS:
             if (nCount > 0 && nValue < texts.size())
             {
                 const std::string text = texts.substr(nValue, nCount);
@@ -151,36 +124,36 @@ std::string GeoKeyList::GetText(std::uint16_t nKey) const
     return XmlTranscode(wide.data(), wide.size());
 }
 
-void GeoKeyList::Store(TagList& oTags) const
+void GeoKeyList::Store(GeoTags& oTags) const
 {
-    std::vector<std::uint64_t> oShorts = {VERSION, 1, 0, moKeys.size()};
-    std::vector<double> oDoubles;
-    std::string texts;
+    oTags.moKeys.clear();
+    oTags.moDoubles.clear();
+    oTags.moTexts.clear();
+    if (moKeys.empty())
+        return;
+    const auto Add = [&oTags](std::uint16_t nTag, std::size_t nCount, std::size_t nValue)
+    {
+        oTags.moKeys.insert(oTags.moKeys.end(),
+                            {nTag, static_cast<std::uint16_t>(nCount), static_cast<std::uint16_t>(nValue)});
+    };
+    oTags.moKeys = {VERSION, 1, 0, static_cast<std::uint16_t>(moKeys.size())};
     for (const auto& [nKey, oValue] : moKeys)
     {
-        oShorts.push_back(nKey);
+        oTags.moKeys.push_back(nKey);
         if (const std::uint16_t* pCode = std::get_if<std::uint16_t>(&oValue))
-            oShorts.insert(oShorts.end(), {0, 1, *pCode});
+            Add(0, 1, *pCode);
         else if (const std::vector<double>* pNumbers = std::get_if<std::vector<double>>(&oValue))
         {
-            oShorts.insert(oShorts.end(), {TAG_DOUBLES, pNumbers->size(), oDoubles.size()});
-            oDoubles.insert(oDoubles.end(), pNumbers->begin(), pNumbers->end());
+            Add(TAG_GEO_DOUBLES, pNumbers->size(), oTags.moDoubles.size());
+            oTags.moDoubles.insert(oTags.moDoubles.end(), pNumbers->begin(), pNumbers->end());
         }
         else
         {
             const std::string text = std::get<std::string>(oValue) + TEXT_END;
-            oShorts.insert(oShorts.end(), {TAG_TEXTS, text.size(), texts.size()});
-            texts += text;
+            Add(TAG_GEO_TEXTS, text.size(), oTags.moTexts.size());
+            oTags.moTexts += text;
         }
     }
-    oTags.Remove(TAG_KEYS);
-    oTags.Remove(TAG_DOUBLES);
-    oTags.SetText(TAG_TEXTS, texts);
-    if (moKeys.empty())
-        return;
-    oTags.SetNumbers(TAG_KEYS, TIFF_SHORT, oShorts);
-    if (!oDoubles.empty())
-        oTags.SetDoubles(TAG_DOUBLES, oDoubles);
 }
 
-} // namespace krv::plugins::tif
+} // namespace krv::plugins::support

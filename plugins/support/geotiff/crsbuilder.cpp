@@ -1,6 +1,6 @@
-#include "plugins/tif/geo/geokeylist.h"
-#include "plugins/tif/geo/geokeys.h"
-#include "plugins/tif/geo/keyrules.h"
+#include "plugins/support/geotiff/geokeylist.h"
+#include "plugins/support/geotiff/geotags.h"
+#include "plugins/support/geotiff/keyrules.h"
 #include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/coordinatetransformation.h"
@@ -15,7 +15,7 @@
 #include <geotiff.h>
 #include <geovalues.h>
 
-namespace krv::plugins::tif
+namespace krv::plugins::support
 {
 namespace
 {
@@ -424,12 +424,13 @@ private:
 
 } // namespace
 
-std::unique_ptr<krv::ogc::cs::ICRS> ReadCRS(TIFF* poFile, std::string* pTrouble, const krv::Place& oPlace)
+std::unique_ptr<krv::ogc::cs::ICRS> ReadCRS(const GeoTags& oTags, const std::string& fileName, std::string* pTrouble,
+                                            const krv::Place& oPlace)
 {
     try
     {
         std::string damage;
-        const GeoKeyList oKeys = GeoKeyList::From(poFile, &damage);
+        const GeoKeyList oKeys = GeoKeyList::From(oTags, &damage);
         if (!damage.empty())
             throw krv::DataException("The geographic keys are damaged: " + damage, oPlace);
         const CRSBuilder oBuilder(oKeys, oPlace);
@@ -441,8 +442,8 @@ std::unique_ptr<krv::ogc::cs::ICRS> ReadCRS(TIFF* poFile, std::string* pTrouble,
     }
     catch (const krv::DataException& oException)
     {
-        throw krv::DataException(std::string(TIFFFileName(poFile)) + ": " + oException.GetMessage(), oPlace);
+        throw krv::DataException(fileName + ": " + oException.GetMessage(), oPlace);
     }
 }
 
-} // namespace krv::plugins::tif
+} // namespace krv::plugins::support

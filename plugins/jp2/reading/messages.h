@@ -1,0 +1,41 @@
+#pragma once
+
+#include <cstring>
+#include <string>
+
+#include <openjpeg.h>
+
+namespace krv::plugins::jp2
+{
+
+// What OpenJPEG has to say of a codec that fails. The first error counts; the others follow from it. Nothing is
+// printed. Outlives the codec's use.
+class Messages
+{
+public:
+    void Watch(opj_codec_t* pCodec)
+    {
+        opj_set_error_handler(pCodec, &OnError, this);
+        opj_set_warning_handler(pCodec, &Ignore, nullptr);
+        opj_set_info_handler(pCodec, &Ignore, nullptr);
+    }
+
+    bool HasError() const { return maError[0] != '\0'; }
+    std::string Get() const { return HasError() ? maError : "OpenJPEG does not say why"; }
+
+private:
+    static void OnError(const char* pText, void* pThis)
+    {
+        auto& oThis = *static_cast<Messages*>(pThis);
+        if (oThis.HasError() || pText == nullptr)
+            return;
+        std::strncpy(oThis.maError, pText, sizeof(oThis.maError) - 1);
+        oThis.maError[std::strcspn(oThis.maError, "\n")] = '\0';
+    }
+
+    static void Ignore(const char*, void*) {}
+
+    char maError[256] = {};
+};
+
+} // namespace krv::plugins::jp2
