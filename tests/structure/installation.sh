@@ -65,6 +65,13 @@ if "$oWork/writer/writetiles" "$oWork/rgb.tif" "$oWork/turned.tif" >"$oWork/take
     exit 1
 fi
 
+cp -r "$oSource/examples/filterscene" "$oWork/filterscene"
+quietly configure cmake -S "$oWork/filterscene" -B "$oWork/filter" -G Ninja -DCMAKE_CXX_COMPILER="$oCompiler" \
+    -DCMAKE_PREFIX_PATH="$oHome"
+quietly filter cmake --build "$oWork/filter"
+quietly filtered "$oWork/filter/filterscene" "$oWork/rgb.tif" "$oWork/smooth.tif"
+expect "600 x 600" "$oHome/bin/krv" info "$oWork/smooth.tif"
+
 export PKG_CONFIG_PATH=$oHome/lib/pkgconfig
 # shellcheck disable=SC2046 # the flags are several words
 quietly pkgconfig "$oCompiler" -std=c++20 "$oWork/readtiles/main.cpp" -o "$oWork/readtiles/plain" \
