@@ -58,7 +58,7 @@ Channels MakeChannels(unsigned int nWidth, unsigned int nHeight, const std::vect
 
 Channels WithoutChannel(const Channels& oChannels, std::size_t nGone)
 {
-    const MemoryChannel oGone = oChannels[nGone];
+    const MemoryChannel& oGone = oChannels[nGone];
     Channels oKept = oChannels;
     oKept.erase(oKept.begin() + static_cast<std::ptrdiff_t>(nGone));
     if (oGone.mpoTiles->GetChannels() == 1)

@@ -92,7 +92,7 @@ private:
     std::unique_ptr<LevelTarget> MakeTarget(Level& oLevel);
     void MakeReducers();
     void AddBounds(const PixelBounds& oPart);
-    void StoreTile(SplitWriter& oSplit, std::shared_ptr<const Raster> poTile);
+    void StoreTile(SplitWriter& oSplit, const std::shared_ptr<const Raster>& poTile);
     void Line(std::function<void()> oWork, std::function<void()> oTake);
     std::vector<PixelBounds> ListWindows() const;
     static WindowPointer Read(IRasterReader& oReader, const SourceForm& oForm, const PixelBounds& oBounds);
@@ -252,7 +252,7 @@ std::unique_ptr<LevelTarget> OverviewBuilder::MakeTarget(Level& oLevel)
     oLevel.mpoMaskIO.reset(mpoMaskManager->GetOverviewIO(oLevel.mnFactor, {mnMask}));
     IRasterIO& oIO = *oLevel.mpoMaskIO;
     // In their turn among the tiles of pixels.
-    const auto Store = [this, &oIO](std::shared_ptr<Raster> poTile)
+    const auto Store = [this, &oIO](const std::shared_ptr<Raster>& poTile)
     {
         const auto Write = [&oIO, poTile]
         {
@@ -310,7 +310,7 @@ void OverviewBuilder::MakeReducers()
         moReducers.push_back(krv::gobs::MakeAverageCascade(moForm, oCascade, moBounds, moOptions.mbHalfValid));
 }
 
-void OverviewBuilder::StoreTile(SplitWriter& oSplit, std::shared_ptr<const Raster> poTile)
+void OverviewBuilder::StoreTile(SplitWriter& oSplit, const std::shared_ptr<const Raster>& poTile)
 {
     using Encoded = std::shared_ptr<const SplitWriter::Encoded>;
     const auto poEncoded = std::make_shared<Encoded>();

@@ -96,6 +96,8 @@ void CopyDescription(IDataset& oSource, IDataset& oTarget)
 
 } // namespace
 
+// The parameters are part of the contract.
+// NOLINTNEXTLINE(performance-unnecessary-value-param)
 IDataset* CreateLinkedPix(std::string target, std::string source)
 {
     const std::unique_ptr<IDataset> poSource(DatasetManager::GetInstance()->Open(source, eReadOnly));

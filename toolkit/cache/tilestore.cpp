@@ -124,7 +124,7 @@ TileHold TileClaim::Withhold(const TileArea& oArea)
 }
 
 // What ends without an exception that could be told, as a thread that is cancelled does, is as if it had not begun.
-void TileClaim::Fail(std::exception_ptr oFailure) noexcept
+void TileClaim::Fail(const std::exception_ptr& oFailure) noexcept
 {
     End(oFailure ? Entry::eFailed : Entry::eWithheld, oFailure);
 }

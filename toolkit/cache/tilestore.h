@@ -172,7 +172,7 @@ public:
     // The tile is made, but for the caller alone; who waits looks again.
     TileHold Withhold(const TileArea& oArea);
     // It cannot be made: who waits gets the exception, and nothing stays.
-    void Fail(std::exception_ptr oFailure) noexcept;
+    void Fail(const std::exception_ptr& oFailure) noexcept;
 
 private:
     friend class TileOwner;

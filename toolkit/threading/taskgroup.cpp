@@ -36,7 +36,7 @@ struct TaskGroup::State
     unsigned int mnServing = 0; // tasks of the executor that are to come or run
 
     // The lock is held before and after.
-    void Run(Waiting::iterator oPlace, std::unique_lock<std::mutex>& oLock)
+    void Run(const Waiting::iterator& oPlace, std::unique_lock<std::mutex>& oLock)
     {
         const std::shared_ptr<Task> poTask = *oPlace;
         moWaiting.erase(oPlace);

@@ -335,6 +335,8 @@ RasterCache::RasterCache(std::shared_ptr<Core> poCore, unsigned int nLevel, std:
     UseSourceGrid();
 }
 
+// A front of its own over the same store; the base has nothing to copy.
+// NOLINTNEXTLINE(bugprone-copy-constructor-init)
 RasterCache::RasterCache(const RasterCache& oOther)
     : DerivedReader(), mpoImage(oOther.mpoImage), mpoFront(std::make_unique<Front>(*mpoImage, nullptr))
 {

@@ -22,7 +22,6 @@ constexpr std::uint64_t MOST_TILES = 65535;
 constexpr unsigned int MOST_CHANNELS = 16384;
 constexpr std::uint64_t LARGEST_TILE_BYTES = std::uint64_t{512} << 20; // of samples as the encoder takes them
 constexpr std::size_t COPY_BYTES = std::size_t{1} << 20;
-constexpr std::size_t SOT_BYTES = 12;
 
 void AppendBox(Bytes& oBytes, std::string_view type, const Bytes& oContent)
 {

@@ -87,8 +87,9 @@ bool ToImage(const RpcCoefficients& oModel, std::size_t nCount, const double* pL
         const double nFarP = std::fabs(nP);
         // Without branches, which would keep the compiler from making vectors of the loop.
         const bool bInside = (nFarL <= REACH) & (nFarP <= REACH);
-        const bool bReached = bInside & (nLineBelow * oM.lineDenominator[0] > 0) &
-                              (nSampleBelow * oM.sampleDenominator[0] > 0) & (nSum - nSum == 0);
+        const bool bLine = nLineBelow * oM.lineDenominator[0] > 0;
+        const bool bSample = nSampleBelow * oM.sampleDenominator[0] > 0;
+        const bool bReached = bInside & bLine & bSample & (nSum - nSum == 0);
         const bool bZero = bInside & ((nLineBelow == 0) | (nSampleBelow == 0));
         nZero |= bZero ? std::uint64_t{1} : std::uint64_t{0};
         aColumn[i] = bReached ? nColumn : NONE;
@@ -202,8 +203,9 @@ bool ToGround(const RpcCoefficients& oModel, std::size_t nCount, const double* p
             const double nSample = oSample.value - aSample[i];
             const double nError = std::fabs(nLine * oM.lineScale) + std::fabs(nSample * oM.sampleScale);
             const bool bOpen = !(nError <= CLOSE_ENOUGH);
-            const bool bReached =
-                (oLine.below * oM.lineDenominator[0] > 0) & (oSample.below * oM.sampleDenominator[0] > 0);
+            const bool bLine = oLine.below * oM.lineDenominator[0] > 0;
+            const bool bSample = oSample.below * oM.sampleDenominator[0] > 0;
+            const bool bReached = bLine & bSample;
             aError[i] = bReached ? nError : NONE;
             const double nPerDeterminant =
                 nMove / (oLine.byLongitude * oSample.byLatitude - oLine.byLatitude * oSample.byLongitude);
