@@ -10,7 +10,6 @@
 
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/metadata/auxiliarydata.h"
-#include "toolkit/nspio/warning.h"
 
 #include <cstring>
 #include <memory>
@@ -67,19 +66,15 @@ void Change(const std::string& fileName)
                 poIO->WriteWindow(0U, 0U, 1U, 1U, oPixel.data());
             });
     Try([&] { poDataset->WriteAuxiliaryData(poDataset->ReadAuxiliaryData()); });
-    Try([&] { poDataset->DeleteBitmap(poDataset->GetBitmapList().at(0)); });
+    const std::vector<unsigned int> oBitmaps = poDataset->GetBitmapList();
+    if (!oBitmaps.empty())
+        Try([&] { poDataset->DeleteBitmap(oBitmaps.front()); });
     Try([&] { poDataset->DeleteChannel(1); });
     Try([&] { poDataset->Verify({}); });
     Try([&] { poDataset->Close(); });
 }
 
 } // namespace
-
-extern "C" int LLVMFuzzerInitialize(int*, char***)
-{
-    krv::nspio::Warning::SetSink([](const std::string&, const std::string&, unsigned int) {});
-    return 0;
-}
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* pBytes, std::size_t nBytes)
 {
