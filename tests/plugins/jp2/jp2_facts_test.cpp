@@ -15,9 +15,9 @@
 #include <cmath>
 #include <cstdio>
 #include <cstring>
+#include <algorithm>
 #include <map>
 #include <memory>
-#include <regex>
 
 namespace krv::plugins::jp2
 {
@@ -46,15 +46,19 @@ struct Grid
     explicit Grid(const Facts& oFacts)
     {
         const std::string& notes = oFacts["notes"];
-        std::smatch oMatch;
-        if (std::regex_search(notes, oMatch, std::regex("image offset (\\d+),(\\d+)")))
+        const std::string OFFSET = "image offset ", STEPS = "subsampling ";
+        const std::size_t nOffset = notes.find(OFFSET), nSteps = notes.find(STEPS);
+        if (nOffset != std::string::npos)
         {
-            mnX = static_cast<unsigned int>(std::stoul(oMatch[1]));
-            mnY = static_cast<unsigned int>(std::stoul(oMatch[2]));
+            const auto oPlace = krv::test::Split(notes.substr(nOffset + OFFSET.size()), ',');
+            mnX = static_cast<unsigned int>(std::stoul(oPlace.at(0)));
+            mnY = static_cast<unsigned int>(std::stoul(oPlace.at(1)));
         }
-        if (!std::regex_search(notes, oMatch, std::regex("subsampling ([0-9x ]+)")))
+        if (nSteps == std::string::npos)
             return;
-        for (const std::string& step : krv::test::Split(oMatch[1], ' '))
+        const std::size_t nFrom = nSteps + STEPS.size();
+        const std::size_t nEnd = std::min(notes.find_first_not_of("0123456789x ", nFrom), notes.size());
+        for (const std::string& step : krv::test::Split(notes.substr(nFrom, nEnd - nFrom), ' '))
             moSteps.push_back({static_cast<unsigned int>(std::stoul(step)),
                                static_cast<unsigned int>(std::stoul(step.substr(step.find('x') + 1)))});
     }
