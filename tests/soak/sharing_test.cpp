@@ -213,5 +213,6 @@ TEST(Stress, ThreadsThatReadAFileWhichIsCutOffAreTold)
         EXPECT_EQ(nTold, 8u);
         krv::conformance::WriteFile(fileName, bytes);
         EXPECT_EQ(CountWrong(fileName, nFile, false, oRandom), 0u);
+        std::filesystem::remove(fileName);
     }
 }
