@@ -1,3 +1,4 @@
+#include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/ifileformat.h"
@@ -53,6 +54,7 @@ struct FormatTraits
     bool mbMixedTypes;
     bool mbOverviews;
     int mnFiles = 1; // of one image
+    bool mbBitmaps = false;
     // Files of other programs are read in tests/plugins.
     void MakeFile(const std::string& file, const Image& oImage) const
     {
@@ -110,7 +112,8 @@ const FormatTraits FORMATS[] = {
       "TILED=NO BLOCKYSIZE=17 COMPRESS=PACKBITS"},
      false,
      true,
-     1},
+     1,
+     true},
     {"KRVDSK",
      "krvdsk",
      {"", "BLOCKXSIZE=64 BLOCKYSIZE=48 INTERLEAVE=BAND", "BLOCKXSIZE=50 BLOCKYSIZE=70 COMPRESS=DEFLATE",
@@ -118,7 +121,8 @@ const FormatTraits FORMATS[] = {
       "BLOCKXSIZE=301 BLOCKYSIZE=7 COMPRESS=LZW INTERLEAVE=BAND"},
      true,
      true,
-     1}};
+     1,
+     true}};
 
 std::string Name(const ::testing::TestParamInfo<FormatTraits>& oInfo)
 {
@@ -182,6 +186,44 @@ TEST_P(FormatConformance, SmallAndThinImagesPassTheChecks)
         oImage.mnHeight = nHeight;
         oImage.moTypes.assign(2, krv::gobs::eDT_16U);
         ExpectConformity(Make(oImage));
+    }
+}
+
+// A bit is one that is set for any byte but 0: what is held back, what is stored and what is opened again say the same.
+TEST_P(FormatConformance, BitmapsReadTheSameBeforeAndAfterTheyAreStored)
+{
+    if (!GetParam().mbBitmaps)
+        GTEST_SKIP() << "no bitmaps";
+    for (unsigned int nVariant = 0; nVariant < GetParam().moVariants.size(); ++nVariant)
+    {
+        SCOPED_TRACE(GetParam().moVariants[nVariant]);
+        Image oImage;
+        oImage.mnVariant = nVariant;
+        const std::string file = Make(oImage, "bits" + std::to_string(nVariant));
+        std::unique_ptr<IDataset> poDataset(DatasetManager::GetInstance()->Open(file, eUpdate));
+        auto* poBitmaps = dynamic_cast<IBitmapDataset*>(poDataset.get());
+        ASSERT_NE(poBitmaps, nullptr);
+        const unsigned int nBitmap = poBitmaps->CreateBitmap();
+        const auto Read = [&]
+        {
+            const std::unique_ptr<IRasterIO> poIO(poBitmaps->GetBitmapIO({nBitmap}));
+            std::string bits(std::size_t{300} * 133, '?');
+            poIO->ReadWindow(0u, 0u, 300u, 133u, reinterpret_cast<unsigned char*>(bits.data()));
+            return bits;
+        };
+        const std::string bytes = {'\0', '\xff', '\2', '\0', '\1', '\x80'};
+        std::string expected(std::size_t{300} * 133, '\0');
+        for (unsigned int n = 0; n < 6; ++n)
+            expected[std::size_t{41 + n / 3} * 300 + 62 + n % 3] = bytes[n] != 0 ? '\1' : '\0';
+        {
+            const std::unique_ptr<IRasterIO> poIO(poBitmaps->GetBitmapIO({nBitmap}));
+            poIO->WriteWindow(62u, 41u, 3u, 2u, reinterpret_cast<unsigned char*>(const_cast<char*>(bytes.data())));
+        }
+        EXPECT_TRUE(Read() == expected) << "held back";
+        poDataset->Close();
+        poDataset.reset(DatasetManager::GetInstance()->Open(file, eReadOnly));
+        poBitmaps = &dynamic_cast<IBitmapDataset&>(*poDataset);
+        EXPECT_TRUE(Read() == expected) << "opened again";
     }
 }
 

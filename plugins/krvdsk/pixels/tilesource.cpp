@@ -66,7 +66,9 @@ std::unique_ptr<TileSource::Work> TileSource::MakeWork(std::size_t nPlane)
     };
     return std::unique_ptr<Work>(
         new Work{poPlane, poPlane->moTables.at(moOrigin.mnLevel), TileCodec(*poPlane),
-                 support::HeldBlocks(ChooseBound(moLayout, nPixelBytes), nPixelBytes, StoreBlock)});
+                 support::HeldBlocks(ChooseBound(moLayout, nPixelBytes), nPixelBytes, StoreBlock,
+                                     poPlane->moType.GetBits() < 8 ? support::HeldBlocks::Samples::eBits
+                                                                   : support::HeldBlocks::Samples::eValues)});
 }
 
 TileSource::Spot TileSource::GetSpot(const support::BlockAddress& oBlock) const
@@ -207,16 +209,6 @@ void TileSource::WriteBlock(const support::BlockAddress& oBlock, const support::
     {
         ReadStored(oWork, oSpot, {0, 0, oSpot.moRect.mnWidth, oSpot.moRect.mnHeight}, pPixels, nHeldPitch);
     };
-    if (oWork.mpoPlane->moType.GetBits() < 8)
-    {
-        // What is held back reads as what is stored does: any byte but 0 is a bit that is set.
-        unsigned char* const pBits = moRows.Get(std::size_t{oPart.mnWidth} * oPart.mnHeight);
-        for (unsigned int nRow = 0; nRow < oPart.mnHeight; ++nRow)
-            for (unsigned int nAt = 0; nAt < oPart.mnWidth; ++nAt)
-                pBits[std::size_t{nRow} * oPart.mnWidth + nAt] = pSource[nRow * nPitch + nAt] != 0 ? 1 : 0;
-        pSource = pBits;
-        nPitch = oPart.mnWidth;
-    }
     oWork.moHeld.Write({oSpot.mnTile, oSpot.moRect},
                        {oSpot.moRect.mnX + oPart.mnX, oSpot.moRect.mnY + oPart.mnY, oPart.mnWidth, oPart.mnHeight},
                        pSource, nPitch, Read);

@@ -19,8 +19,8 @@ PixelRect Intersect(const PixelRect& oFirst, const PixelRect& oSecond)
     return {nX, nY, nRight - nX, nBottom - nY};
 }
 
-HeldBlocks::HeldBlocks(std::size_t nBound, std::size_t nPixelBytes, StoreBlock oStore)
-    : mnBound(nBound), mnPixelBytes(nPixelBytes), moStore(std::move(oStore))
+HeldBlocks::HeldBlocks(std::size_t nBound, std::size_t nPixelBytes, StoreBlock oStore, Samples eSamples)
+    : mnBound(nBound), mnPixelBytes(nPixelBytes), meSamples(eSamples), moStore(std::move(oStore))
 {
 }
 
@@ -28,10 +28,14 @@ void HeldBlocks::Write(const Block& oBlock, const PixelRect& oPart, const unsign
                        const ReadBlock& oRead)
 {
     const std::size_t nHeldPitch = GetPitch(oBlock);
-    raster::CopyRows(pSource, nPitch,
-                     Hold(oBlock, oRead).moPixels.data() + (oPart.mnY - oBlock.moRect.mnY) * nHeldPitch +
-                         (oPart.mnX - oBlock.moRect.mnX) * mnPixelBytes,
-                     nHeldPitch, oPart.mnWidth * mnPixelBytes, oPart.mnHeight);
+    unsigned char* const pHeld = Hold(oBlock, oRead).moPixels.data() + (oPart.mnY - oBlock.moRect.mnY) * nHeldPitch +
+                                 (oPart.mnX - oBlock.moRect.mnX) * mnPixelBytes;
+    const std::size_t nRowBytes = oPart.mnWidth * mnPixelBytes;
+    raster::CopyRows(pSource, nPitch, pHeld, nHeldPitch, nRowBytes, oPart.mnHeight);
+    if (meSamples == Samples::eBits)
+        for (unsigned int nRow = 0; nRow < oPart.mnHeight; ++nRow)
+            std::transform(pHeld + nRow * nHeldPitch, pHeld + nRow * nHeldPitch + nRowBytes, pHeld + nRow * nHeldPitch,
+                           [](unsigned char nByte) { return static_cast<unsigned char>(nByte != 0); });
 }
 
 void HeldBlocks::Overlay(std::uint64_t nBlock, const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) const

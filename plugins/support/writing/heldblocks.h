@@ -31,7 +31,14 @@ public:
     // Fills in what the file has of it; the memory holds 0.
     using ReadBlock = std::function<void(unsigned char* pPixels, std::size_t nPitch)>;
 
-    HeldBlocks(std::size_t nBound, std::size_t nPixelBytes, StoreBlock oStore);
+    // Of single bits, a byte each, any byte but 0 is one that is set: it is held as 1, as it reads when it is stored.
+    enum class Samples
+    {
+        eValues,
+        eBits
+    };
+
+    HeldBlocks(std::size_t nBound, std::size_t nPixelBytes, StoreBlock oStore, Samples eSamples = Samples::eValues);
 
     bool IsEmpty() const { return moHeld.empty(); }
     // Takes a part of a block, as a rectangle of the image.
@@ -57,6 +64,7 @@ private:
 
     std::size_t mnBound;
     std::size_t mnPixelBytes;
+    Samples meSamples;
     StoreBlock moStore;
     std::size_t mnHeldBytes = 0;
     std::list<Held> moHeld; // the one used last first

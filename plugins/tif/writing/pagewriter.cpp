@@ -33,9 +33,11 @@ PageWriter::PageWriter(std::shared_ptr<FileEditor> poEditor, std::shared_ptr<Pag
                        std::shared_ptr<Page> poPage, PixelUse eUse)
     : mpoEditor(std::move(poEditor)), mpoModel(std::move(poModel)), mpoPage(std::move(poPage)),
       moForm(mpoPage->GetForm()), moReader(mpoPage, eUse), moEncoder(*mpoPage, eUse, mpoEditor->GetOptions().moLevel),
-      moHeld(ChooseBound(moForm, GetPixelBytes()), GetPixelBytes(),
-             [this](const support::HeldBlocks::Block& oBlock, const unsigned char* pPixels)
-             { Store(oBlock, pPixels, oBlock.moRect.mnWidth * GetPixelBytes()); })
+      moHeld(
+          ChooseBound(moForm, GetPixelBytes()), GetPixelBytes(),
+          [this](const support::HeldBlocks::Block& oBlock, const unsigned char* pPixels)
+          { Store(oBlock, pPixels, oBlock.moRect.mnWidth * GetPixelBytes()); },
+          eUse == PixelUse::eBitmap ? support::HeldBlocks::Samples::eBits : support::HeldBlocks::Samples::eValues)
 {
 }
 
