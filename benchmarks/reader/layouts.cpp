@@ -95,11 +95,11 @@ void MeasureLayout(const std::string& path, const Layout& oLayout)
             std::memcmp(oRaster->GetBuffer(), oBlocks.ReadTile(nBlock), oBlocks.GetBytes()) != 0)
             throw std::runtime_error("the candidates differ over " + path);
     }
-    // Opened for each pass: what an earlier one left in a cache must not count.
     const unsigned int nTileWidth = oReader.GetTileWidth(), nTileHeight = oReader.GetTileHeight();
     const auto oTimes = MedianSeconds({{"reader",
                                         [&]
                                         {
+                                            ForgetTiles();
                                             krv::datasources::BasicReader oFresh(path);
                                             oFresh.SetTileSize(nTileWidth, nTileHeight);
                                             ReadTiles(oFresh, 0, oBlocks.GetCount());

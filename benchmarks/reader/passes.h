@@ -4,6 +4,7 @@
 #include "benchmarks/support/scene.h"
 #include "datasources/reader/basicreader.h"
 #include "gobs/raster/raster.h"
+#include "toolkit/cache/tilestore.h"
 
 #include <memory>
 #include <string>
@@ -13,8 +14,15 @@
 namespace krv::benchmarks
 {
 
+// The process's tiles outlive the dataset they are of: what an earlier pass left there must not count.
+inline void ForgetTiles()
+{
+    krv::cache::TileStore::Process().Clear();
+}
+
 inline std::unique_ptr<krv::datasources::BasicReader> OpenScene(const SceneFile& oScene)
 {
+    ForgetTiles();
     return std::make_unique<krv::datasources::BasicReader>(oScene.moPath, std::vector<unsigned int>());
 }
 

@@ -15,6 +15,9 @@ namespace
 {
 
 constexpr std::size_t KEPT_SCRATCH_BYTES = std::size_t{4} << 20;
+// The JPEG library writes coloured rows past the processor's caches, and waits for each, where they lie on 16 or 32
+// bytes: into memory that does not, tiles of 256 are decoded in half the time, the copy out of it included.
+constexpr std::size_t OFF_ALIGNMENT = 8;
 constexpr bool BIG_ENDIAN_MACHINE = std::endian::native == std::endian::big;
 
 } // namespace
@@ -104,7 +107,10 @@ void StrileDecoder::Decode(std::uint32_t nStrile, std::uint32_t nStoredRows, uns
     // Before a predictor, memory that stays in the processor's caches takes what the codec writes and reads again; the
     // target is then written once.
     const bool bPassing = bOwn && moForm.mnPredictor != PREDICTOR_NONE && nBytes <= KEPT_SCRATCH_BYTES;
-    unsigned char* pStored = bDirect && !bPassing ? oWanted.mpTarget : moScratch.Get(nBytes);
+    const bool bColours = moForm.mnPhotometric == PHOTOMETRIC_YCBCR;
+    unsigned char* pStored = bColours               ? moScratch.Get(nBytes + OFF_ALIGNMENT) + OFF_ALIGNMENT
+                             : bDirect && !bPassing ? oWanted.mpTarget
+                                                    : moScratch.Get(nBytes);
     if (!bOwn)
     {
         // A codec that stops early must not hand out what was there before.
