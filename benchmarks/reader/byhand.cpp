@@ -1,6 +1,7 @@
 #include "benchmarks/reader/byhand.h"
 
 #include "plugins/support/codec/predictor.h"
+#include "toolkit/cache/tilestore.h"
 #include "toolkit/core/hmalloc.h"
 
 #include <fcntl.h>
@@ -89,8 +90,7 @@ void ByLibtiff::ReadTile(unsigned int nTile, unsigned char* pTarget)
 
 CachedTiles::CachedTiles(const SceneFile& oScene) : moSource(oScene), mnTileBytes(oScene.TileBytes())
 {
-    const unsigned long long nRows = 3 * oScene.TilesAcross() * oScene.TileBytes();
-    mnMost = std::clamp<unsigned long long>(nRows, 64ull << 20, 256ull << 20) / mnTileBytes;
+    mnMost = krv::cache::TileStore::Process().GetBudget() / mnTileBytes;
 }
 
 const unsigned char* CachedTiles::ReadTile(unsigned int nTile)

@@ -58,8 +58,7 @@ private:
     std::vector<unsigned char> moTile;
 };
 
-// The same behind a cache of tiles that holds as much as the library's does of the file: 64 MiB, or three rows of tiles
-// where that is more, at most 256 MiB; the least recently used go first.
+// The same behind a cache of tiles that holds as many bytes as the process's; the least recently used go first.
 class CachedTiles
 {
 public:

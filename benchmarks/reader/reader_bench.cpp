@@ -125,11 +125,13 @@ void MeasureMargins(const SceneFile& oScene, unsigned int nMargin, double nGoal)
     const auto oTimes = MedianSeconds({{"plain",
                                         [&]
                                         {
+                                            ForgetTiles();
                                             ReadTiles(*oPlain, 0, nTiles);
                                         }},
                                        {"margins",
                                         [&]
                                         {
+                                            ForgetTiles();
                                             ReadTiles(*oMargins, 0, nTiles);
                                         }}},
                                       5);
