@@ -271,6 +271,8 @@ int main(int nArguments, char** pArguments)
     const std::string& folder = oArguments.GetWords().front();
     std::filesystem::create_directories(folder);
     const unsigned int nSize = oArguments.GetNumber("size", 8192);
+    if (nSize == 0 || nSize % (256U << 5) != 0)
+        throw std::invalid_argument("--size: the loop by hand has whole tiles in all levels: a multiple of 8192");
     const SceneFile oScene = MakeScene(folder, {"8U x 3", 3, 8, false}, "none", 256, nSize);
 
     PrintHeading("Averaging in memory, against reading the source once");
