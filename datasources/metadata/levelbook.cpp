@@ -5,6 +5,7 @@
 #include "toolkit/core/lettercase.h"
 
 #include <algorithm>
+#include <charconv>
 
 namespace krv::datasources
 {
@@ -34,8 +35,8 @@ void SetLevelValid(AuxiliaryData& oBook, unsigned int nChannel, unsigned int nLe
 {
     const std::string suffix = method.empty() ? std::string() : " " + method;
     oBook.SetChanMetadataValue(GetKey(nLevel), (bValid ? VALID : INVALID) + suffix, nChannel);
-    if (!method.empty() && !oBook.GetFileMetadataValue(FOREIGN_METHOD_KEY).empty())
-        oBook.SetFileMetadataValue(FOREIGN_METHOD_KEY, method);
+    if (!method.empty())
+        RenameForeignMethod(oBook, method);
 }
 
 bool SetLevelInvalid(AuxiliaryData& oBook, unsigned int nLevel)
@@ -89,6 +90,28 @@ std::string GetLevelMethod(const AuxiliaryData& oBook, unsigned int nLevel)
     const std::size_t nBlank = state.find(' ');
     return nBlank != std::string::npos ? state.substr(nBlank + 1)
                                        : ParseLevelMethod(oBook.GetFileMetadataValue(FOREIGN_METHOD_KEY));
+}
+
+std::vector<unsigned int> GetBookedLevels(const AuxiliaryData& oBook)
+{
+    std::vector<unsigned int> oLevels;
+    if (oBook.GetChannelCount() == 0)
+        return oLevels;
+    const std::string prefix = GetKey(0).substr(0, GetKey(0).size() - 1);
+    for (const auto& [key, value] : oBook.GetChanMetadata(1))
+    {
+        unsigned int nLevel = 0;
+        if (key.starts_with(prefix) &&
+            std::from_chars(key.data() + prefix.size(), key.data() + key.size(), nLevel).ptr == key.data() + key.size())
+            oLevels.push_back(nLevel);
+    }
+    return oLevels;
+}
+
+void RenameForeignMethod(AuxiliaryData& oBook, const std::string& method)
+{
+    if (!oBook.GetFileMetadataValue(FOREIGN_METHOD_KEY).empty())
+        oBook.SetFileMetadataValue(FOREIGN_METHOD_KEY, method);
 }
 
 std::string ParseLevelMethod(const std::string& name)

@@ -28,8 +28,14 @@ KRV_DATASOURCES_API void CopyLevel(const AuxiliaryData& oFrom, AuxiliaryData& oT
 // new ones, of which no level is valid. oLevels: that the file has.
 KRV_DATASOURCES_API AuxiliaryData TakeChannels(const AuxiliaryData& oRecord, const std::vector<unsigned int>& oSources,
                                                const std::vector<unsigned int>& oLevels);
+// The levels that channel 1 has an entry of.
+KRV_DATASOURCES_API std::vector<unsigned int> GetBookedLevels(const AuxiliaryData& oBook);
 // In capitals; empty when it is not known.
 KRV_DATASOURCES_API std::string GetLevelMethod(const AuxiliaryData& oBook, unsigned int nLevel);
+
+// Puts another name in the place of the method by which all levels without an entry were made; nothing where none is
+// named.
+KRV_DATASOURCES_API void RenameForeignMethod(AuxiliaryData& oBook, const std::string& method);
 
 // The name of a method in capitals, given in any letter case; empty for one that overview managers do not know.
 KRV_DATASOURCES_API std::string ParseLevelMethod(const std::string& name);

@@ -5,6 +5,8 @@
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/checkrastercompatible.h"
 #include "datasources/reader/detail/rasterchannels.h"
+#include "datasources/reader/readervalidity.h"
+#include "gobs/mask/mask.h"
 #include "gobs/mask/samplematch.h"
 #include "gobs/raster/buffertype.h"
 #include "gobs/raster/raster.h"
@@ -60,6 +62,17 @@ Axis ColumnsOf(const krv::gobs::Raster& oRaster, const IRasterReader& oReader)
 Axis RowsOf(const krv::gobs::Raster& oRaster, const IRasterReader& oReader)
 {
     return {oRaster.GetY(), oRaster.GetYMargin(), oRaster.GetFullHeight(), oReader.GetHeight()};
+}
+
+// A raster that lies inside the image as one without margins, over the same buffer.
+krv::gobs::Raster AsWindow(krv::gobs::Raster& oRaster)
+{
+    return {krv::gobs::RasterInfo(static_cast<unsigned int>(oRaster.GetFullWidth()),
+                                  static_cast<unsigned int>(oRaster.GetFullHeight()), oRaster.GetChansCount(),
+                                  oRaster.GetDataType()),
+            krv::gobs::RasterContext(static_cast<int>(static_cast<long long>(oRaster.GetX()) - oRaster.GetXMargin()),
+                                     static_cast<int>(static_cast<long long>(oRaster.GetY()) - oRaster.GetYMargin())),
+            oRaster.GetBuffer(), false};
 }
 
 // For each position the pixel of the image that stands for it.
@@ -143,6 +156,31 @@ void CopyRow(const unsigned char* pSource, const Span& oColumns, unsigned char* 
 
 } // namespace
 
+// The validity of a reader as one 8-bit channel: 1 where it is valid.
+class ExactHaloReader::ValidityChannel : public DerivedReader
+{
+public:
+    explicit ValidityChannel(IRasterReader& oReader) { SetSource({&oReader, {false}}); }
+
+    unsigned int GetChansCount() const override { return 1; }
+    const krv::gobs::DataType& GetDataType() const override { return moType; }
+    using DerivedReader::ReadRaster;
+    void ReadRaster(krv::gobs::Raster* poRaster) override
+    {
+        const IRasterReader& oSource = GetSource();
+        krv::gobs::Raster oPixels(
+            {poRaster->GetWidth(), poRaster->GetHeight(), oSource.GetChansCount(), oSource.GetDataType()},
+            poRaster->GetContext());
+        if (const auto poMask = GetSourceValidity().Read(oPixels))
+            poMask->RetrieveRaster(*poRaster);
+        else
+            std::fill_n(poRaster->GetBuffer(), poRaster->GetBufferSize(), static_cast<unsigned char>(1));
+    }
+
+private:
+    krv::gobs::DataType moType = krv::gobs::eDT_8U;
+};
+
 ExactHaloReader::ExactHaloReader(IRasterReader* poSource, bool bTakeOwnership)
 {
     if (poSource == nullptr)
@@ -193,7 +231,7 @@ void ExactHaloReader::ReadRaster(krv::gobs::Raster* poRaster)
     const eMarginBehaviour eBehaviour = GetMarginBehaviour();
     const Axis oColumns = ColumnsOf(*poRaster, *this);
     const Axis oRows = RowsOf(*poRaster, *this);
-    if (oColumns.IsInside() && oRows.IsInside())
+    if (IsInside(*poRaster))
         return ReadInside(*poRaster);
     if (eBehaviour == eException)
         throw krv::DataException("Margin behaviour is eException", oPlace);
@@ -210,6 +248,39 @@ void ExactHaloReader::ReadRaster(krv::gobs::Raster* poRaster)
     krv::gobs::FillRasterSides(*poRaster, eBehaviour, static_cast<std::uint64_t>(oColumns.mnBefore),
                                static_cast<std::uint64_t>(oColumns.mnBehind),
                                static_cast<std::uint64_t>(oRows.mnBefore), static_cast<std::uint64_t>(oRows.mnBehind));
+}
+
+bool ExactHaloReader::IsInside(const krv::gobs::Raster& oRaster) const
+{
+    return ColumnsOf(oRaster, *this).IsInside() && RowsOf(oRaster, *this).IsInside();
+}
+
+std::unique_ptr<krv::gobs::Mask> ExactHaloReader::ReadValid(krv::gobs::Raster& oRaster)
+{
+    krv::gobs::CheckRasterCompatible(&oRaster, this);
+    if (IsInside(oRaster))
+    {
+        // As one window without margins, as ReadInside has it.
+        krv::gobs::Raster oWindow = AsWindow(oRaster);
+        const std::unique_ptr<krv::gobs::Mask> poWindow = GetSourceValidity().Read(oWindow);
+        if (poWindow == nullptr)
+            return nullptr;
+        auto poMask = std::make_unique<krv::gobs::Mask>(oRaster.GetInfo(), oRaster.GetContext());
+        std::copy_n(poWindow->GetBits(), poMask->GetBitsSize(), poMask->GetBits());
+        return poMask;
+    }
+    if (mpoValidity == nullptr)
+    {
+        auto poChannel = std::make_unique<ValidityChannel>(GetSource());
+        mpoValidity = std::make_unique<ExactHaloReader>(poChannel.get(), true);
+        static_cast<void>(poChannel.release());
+    }
+    const eMarginBehaviour eBehaviour = GetMarginBehaviour();
+    mpoValidity->SetMargins(0, 0, eBehaviour == eNoData ? eConstant : eBehaviour);
+    ReadRaster(&oRaster);
+    krv::gobs::Raster oValid({oRaster.GetWidth(), oRaster.GetHeight(), 1, krv::gobs::eDT_8U}, oRaster.GetContext());
+    mpoValidity->ReadRaster(&oValid);
+    return std::make_unique<krv::gobs::Mask>(oValid.GetInfo(), oValid.GetContext(), oValid.GetBuffer(), false);
 }
 
 // What lies in the image, as one window. It comes straight into the raster when it is all of the raster's rows, and

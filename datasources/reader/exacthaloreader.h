@@ -35,8 +35,14 @@ public:
 
     using DerivedReader::ReadRaster;
     void ReadRaster(krv::gobs::Raster* poRaster) override;
+    // Whether a raster with its margins lies in the image.
+    bool IsInside(const krv::gobs::Raster& oRaster) const;
+    // Pixels that are made of the constant or the no-data value are not valid.
+    std::unique_ptr<krv::gobs::Mask> ReadValid(krv::gobs::Raster& oRaster) override;
 
 private:
+    class ValidityChannel;
+
     LevelWrapper GetLevelWrapper() const override;
     void ReadInside(krv::gobs::Raster& oRaster);
     void ReadScattered(krv::gobs::Raster& oRaster);
@@ -44,6 +50,7 @@ private:
 
     BasicReader* mpoPlainSource = nullptr; // the source, when it is a BasicReader that nobody derived from
     std::vector<double> moConstant;
+    std::unique_ptr<ExactHaloReader> mpoValidity; // of the source as a channel; made when margins ask for it
     std::size_t mnPixelBytes = 0;
 };
 

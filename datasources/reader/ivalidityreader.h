@@ -23,7 +23,8 @@ public:
 
     // Whether there is anything that could make a pixel of the image invalid.
     virtual bool HasValidity() = 0;
-    // Fills a raster as ReadRaster does, and gives a new mask over its full extent whose set bits are valid pixels.
+    // Fills a raster as ReadRaster does, and gives a new mask over its full extent whose set bits are valid pixels, or
+    // null when all pixels of the image are.
     // Margins that are copies of pixels are as valid as these; others outside the image are not.
     virtual std::unique_ptr<krv::gobs::Mask> ReadValid(krv::gobs::Raster& oRaster) = 0;
 };

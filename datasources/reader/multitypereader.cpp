@@ -8,6 +8,9 @@
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/detail/rasterchannels.h"
 #include "datasources/reader/multitypeoverviewreaderaccessor.h"
+#include "datasources/reader/readervalidity.h"
+#include "datasources/reader/validitysource.h"
+#include "gobs/mask/mask.h"
 #include "gobs/raster/buffertype.h"
 #include "gobs/raster/raster.h"
 #include "toolkit/core/hblock.h"
@@ -98,7 +101,12 @@ struct MultiTypeReader::State
     State() = default;
     State(const State&) = delete;
     State& operator=(const State&) = delete;
-    ~State() { moGroups.clear(); } // before the dataset
+    ~State() // before the dataset
+    {
+        moWords.clear();
+        mpoValidity.reset();
+        moGroups.clear();
+    }
 
     std::vector<Group> moGroups; // ascending by data type
     OwnedOrBorrowed<IDataset> mpoDataset;
@@ -108,6 +116,9 @@ struct MultiTypeReader::State
     eChannelPlacement mePlacement = eFromFirstPlace;
     bool mbOverviewsDisabled = false;               // the readers were ready-made
     std::unique_ptr<krv::raster::Merger> mpoMerger; // made by the first reading
+    std::unique_ptr<ValiditySource> mpoValidity;    // made when it is asked for, as the following
+    // Of ready-made readers, what no value of theirs says, by the group.
+    std::vector<std::pair<std::size_t, std::unique_ptr<ReaderValidity>>> moWords;
 };
 
 MultiTypeReader::MultiTypeReader() : mpoState(std::make_shared<State>()) {}
@@ -424,6 +435,61 @@ IDataset* MultiTypeReader::GetDataset() const
 const std::vector<unsigned int>& MultiTypeReader::GetChannels() const
 {
     return mpoState->moChannels;
+}
+
+void MultiTypeReader::FindValidity()
+{
+    if (mpoState->mpoValidity != nullptr)
+        return;
+    IDataset* const poDataset = mpoState->mpoDataset.get();
+    const std::vector<Group>& oGroups = mpoState->moGroups;
+    const bool bOfDataset = std::all_of(oGroups.begin(), oGroups.end(),
+                                        [&](const Group& oGroup)
+                                        {
+                                            const auto* const po =
+                                                dynamic_cast<const RasterAccess*>(oGroup.mpoReader.get());
+                                            return po != nullptr && po->GetDataset() == poDataset;
+                                        });
+    if (bOfDataset)
+    {
+        mpoState->mpoValidity =
+            std::make_unique<ValiditySource>(poDataset, mpoState->moChannels, GetWidth(), GetHeight());
+        return;
+    }
+    auto poValidity = std::make_unique<ValiditySource>(static_cast<const IRasterReader&>(*this));
+    for (std::size_t nGroup = 0; nGroup < oGroups.size(); ++nGroup)
+    {
+        auto poWord = std::make_unique<ReaderValidity>(*oGroups[nGroup].mpoReader);
+        if (poWord->IsNeeded() && !poWord->IsByValues())
+            mpoState->moWords.emplace_back(nGroup, std::move(poWord));
+    }
+    mpoState->mpoValidity = std::move(poValidity);
+}
+
+bool MultiTypeReader::HasValidity()
+{
+    FindValidity();
+    const ValiditySource& oValidity = *mpoState->mpoValidity;
+    return oValidity.HasNoData() || oValidity.HasBitmap() || oValidity.HasAlpha() || !mpoState->moWords.empty();
+}
+
+std::unique_ptr<krv::gobs::Mask> MultiTypeReader::ReadValid(krv::gobs::Raster& oRaster)
+{
+    ReadRaster(&oRaster);
+    if (!HasValidity())
+        return nullptr;
+    mpoState->mpoValidity->SetMarginBehaviour(GetMarginBehaviour());
+    std::unique_ptr<krv::gobs::Mask> poMask(mpoState->mpoValidity->BuildMask(oRaster));
+    for (const auto& [nGroup, poWord] : mpoState->moWords)
+    {
+        const Group& oGroup = mpoState->moGroups[nGroup];
+        krv::gobs::Raster oPart({oRaster.GetWidth(), oRaster.GetHeight(),
+                                 static_cast<unsigned int>(oGroup.moPositions.size()), oGroup.mpoReader->GetDataType()},
+                                oRaster.GetContext());
+        if (const auto poOther = poWord->Read(oPart))
+            poMask->KeepCommon(*poOther);
+    }
+    return poMask;
 }
 
 } // namespace krv::datasources

@@ -79,6 +79,11 @@ public:
     IDataset* GetDataset() const override;
     const std::vector<unsigned int>& GetChannels() const override;
 
+    // What the dataset says of the channels. Of ready-made readers that stand on something else: their no-data values,
+    // in all channels that have one, and what else each of them knows.
+    bool HasValidity() override;
+    std::unique_ptr<krv::gobs::Mask> ReadValid(krv::gobs::Raster& oRaster) override;
+
 protected:
     // For derived readers, which set up their own state by what the public constructors call, and before anything else
     // is: channels of a dataset, which goes with the reader when it is owned, or ready-made readers; then the type.
@@ -96,6 +101,7 @@ private:
     void OpenFile(const std::string& fileName, const std::vector<unsigned int>& oChannels, eChannelPlacement ePlacement,
                   const krv::Place& oPlace);
     void Settle();
+    void FindValidity();
     void WarnOfLoss(const krv::gobs::DataType& oType, const krv::Place& oPlace) const;
     void ReadGroups(krv::gobs::Raster& oRaster);
     krv::raster::Merger& GetMerger();

@@ -35,26 +35,37 @@ ReaderValidity::ReaderValidity(IRasterReader& oReader, krv::gobs::BkgdRule eRule
 {
     if (mpoFacet == nullptr)
         mpoSource = MakeSource(oReader, eRule);
-    mbNeeded = mpoFacet != nullptr ? mpoFacet->HasValidity()
-                                   : mpoSource->HasNoData() || mpoSource->HasBitmap() || mpoSource->HasAlpha();
+    else if (eRule == krv::gobs::eAnyChannel && oReader.GetChansCount() > 1)
+        mpoSource = std::make_unique<ValiditySource>(oReader, eRule);
+    const bool bSource =
+        mpoSource != nullptr && (mpoSource->HasNoData() || mpoSource->HasBitmap() || mpoSource->HasAlpha());
+    if (!bSource)
+        mpoSource.reset();
+    mbNeeded = bSource || (mpoFacet != nullptr && mpoFacet->HasValidity());
 }
 
 ReaderValidity::~ReaderValidity() = default;
 
 bool ReaderValidity::IsByValues() const
 {
-    return mpoSource != nullptr && !mpoSource->HasBitmap() && !mpoSource->HasAlpha();
+    return mpoFacet == nullptr && mpoSource != nullptr && !mpoSource->HasBitmap() && !mpoSource->HasAlpha();
 }
 
 std::unique_ptr<krv::gobs::Mask> ReaderValidity::Read(krv::gobs::Raster& oRaster)
 {
+    std::unique_ptr<krv::gobs::Mask> poMask;
     if (mbNeeded && mpoFacet != nullptr)
-        return mpoFacet->ReadValid(oRaster);
-    moReader.ReadRaster(&oRaster);
-    if (!mbNeeded)
-        return nullptr;
+        poMask = mpoFacet->ReadValid(oRaster);
+    else
+        moReader.ReadRaster(&oRaster);
+    if (mpoSource == nullptr)
+        return poMask;
     mpoSource->SetMarginBehaviour(moReader.GetMarginBehaviour());
-    return std::unique_ptr<krv::gobs::Mask>(mpoSource->BuildMask(oRaster));
+    std::unique_ptr<krv::gobs::Mask> poByValues(mpoSource->BuildMask(oRaster));
+    if (poMask == nullptr)
+        return poByValues;
+    poMask->KeepCommon(*poByValues);
+    return poMask;
 }
 
 } // namespace krv::datasources

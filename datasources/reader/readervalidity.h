@@ -20,7 +20,8 @@ class ValiditySource;
 
 // Reads the rasters of any reader with the validity of their pixels: by the reader's own word when it has
 // IValidityReader, else by all that the dataset behind it says (ValiditySource), of a level too, else by its record
-// alone. One thread at a time.
+// alone. Where any channel's no-data value makes a pixel invalid, the record counts beside the reader's own word, which
+// is of all channels. One thread at a time.
 class KRV_DATASOURCES_API ReaderValidity
 {
 public:
@@ -33,7 +34,7 @@ public:
 
     // Whether any pixel of the image could be invalid.
     bool IsNeeded() const { return mbNeeded; }
-    // Whether nothing but the values of the pixels themselves says so.
+    // Whether nothing but the values of the pixels themselves says so, by the record of their dataset.
     bool IsByValues() const;
     // Fills the raster, and gives a new mask over its full extent whose set bits are valid pixels; null, which means
     // all pixels of the image, when it is not needed.
@@ -42,7 +43,7 @@ public:
 private:
     IRasterReader& moReader;
     IValidityReader* mpoFacet;                 // of the reader, or null
-    std::unique_ptr<ValiditySource> mpoSource; // where there is no facet
+    std::unique_ptr<ValiditySource> mpoSource; // where there is no facet, or beside it
     bool mbNeeded;
 };
 

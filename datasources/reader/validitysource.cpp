@@ -179,11 +179,16 @@ void ValiditySource::FindBitmap(IDataset& oDataset)
 
 void ValiditySource::UseLevel(IDataset& oDataset, unsigned int nWidth, unsigned int nHeight)
 {
+    std::unique_ptr<BasicReader> poStored;
+    if (mpoBitmapReader != nullptr)
+        poStored = detail::ReadStoredLevel(oDataset, mnBitmap, nWidth, nHeight);
     for (std::unique_ptr<BasicReader>* const poReader : {&mpoBitmapReader, &mpoAlphaReader})
     {
         if (*poReader != nullptr)
             *poReader = detail::ReadReduced(oDataset, std::move(*poReader), nWidth, nHeight);
     }
+    if (poStored != nullptr)
+        mpoBitmapReader = std::move(poStored);
     mnImageWidth = nWidth;
     mnImageHeight = nHeight;
 }

@@ -38,7 +38,8 @@ public:
     explicit ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels = {},
                             krv::gobs::BkgdRule eRule = krv::gobs::eAllChannels, bool bNoData = true);
     // For rasters of a level of that size, or of the image itself, with everything that the dataset says: a pixel of a
-    // level is valid by mask bitmap or alpha where any pixel of its box is. Throws the same.
+    // level is valid by mask bitmap or alpha where any pixel of its box is, by the mask's own level where the dataset
+    // holds one of that size. Throws the same.
     ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels, unsigned int nWidth,
                    unsigned int nHeight, krv::gobs::BkgdRule eRule = krv::gobs::eAllChannels);
     // For rasters of the reader, a level's too: by what its metadata and its channels say. There is no bitmap, and

@@ -180,6 +180,14 @@ void Mask::SetBit(std::uint64_t nColumn, std::uint64_t nRow)
     mpBits[nIndex / 8] |= static_cast<unsigned char>(128u >> (nIndex % 8));
 }
 
+void Mask::KeepCommon(const Mask& oOther)
+{
+    if (oOther.GetFullWidth() != GetFullWidth() || oOther.GetFullHeight() != GetFullHeight())
+        throw krv::DataException("The masks differ in their extent");
+    for (std::uint64_t n = 0; n < mnBitsSize; ++n)
+        mpBits[n] &= oOther.mpBits[n];
+}
+
 std::uint64_t Mask::CountSet() const
 {
     return CountRun(mpBits, 0, GetFullWidth() * GetFullHeight());

@@ -53,6 +53,9 @@ public:
     bool GetBit(std::uint64_t nColumn, std::uint64_t nRow) const;
     void SetBit(std::uint64_t nColumn, std::uint64_t nRow);
 
+    // Leaves the bits that another mask of the same full extent has set too. Throws DataException for another extent.
+    void KeepCommon(const Mask& oOther);
+
     // Set bits in the whole full extent, and in the centre alone.
     std::uint64_t CountSet() const;
     std::uint64_t CountSetInCentre() const;

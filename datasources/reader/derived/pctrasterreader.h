@@ -1,7 +1,6 @@
 #pragma once
 
 #include "datasources/reader/derived/derivedreader.h"
-#include "datasources/reader/ivalidityreader.h"
 
 #include <memory>
 #include <string>
@@ -31,7 +30,7 @@ enum eColourAlpha
 // IValidityReader, which answers as the source would, and in the alpha channel, which is 0 where a pixel is not valid.
 // The record keeps the file's tags without what colours make untrue, and the description of the channel, in channel 1.
 // It shows no dataset: the values of its pixels are not those of one.
-class KRV_DATASOURCES_API PCTRasterReader : public DerivedReader, public IValidityReader
+class KRV_DATASOURCES_API PCTRasterReader : public DerivedReader
 {
 public:
     // The source outlives this reader unless bTakeOwnership says that it goes with it; on failure it stays the

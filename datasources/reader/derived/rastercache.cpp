@@ -4,8 +4,8 @@
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/checkrastercompatible.h"
-#include "datasources/reader/derived/detail/bordered.h"
 #include "datasources/reader/detail/rasterchannels.h"
+#include "datasources/reader/exacthaloreader.h"
 #include "datasources/reader/readervalidity.h"
 #include "gobs/mask/mask.h"
 #include "gobs/raster/raster.h"
@@ -177,10 +177,11 @@ public:
             });
     }
 
-    detail::Bordered* GetBordered(RasterCache& oReader)
+    // Over the front itself, for rasters that reach outside; null without exact margins.
+    ExactHaloReader* GetBordered(RasterCache& oReader)
     {
         if (moImage.mpoCore->moOptions.mbExactMargins && mpoBordered == nullptr)
-            mpoBordered = std::make_unique<detail::Bordered>(oReader);
+            mpoBordered = std::make_unique<ExactHaloReader>(&oReader, false);
         return mpoBordered.get();
     }
 
@@ -276,7 +277,7 @@ private:
     Image& moImage;
     std::unique_ptr<IRasterReader> mpoOwn;
     std::unique_ptr<ReaderValidity> mpoValidity; // of the source; used as that is
-    std::unique_ptr<detail::Bordered> mpoBordered;
+    std::unique_ptr<ExactHaloReader> mpoBordered;
 };
 
 // The levels of a source, each behind the same tiles.
@@ -344,7 +345,7 @@ RasterCache::RasterCache(const RasterCache& oOther)
         throw krv::DataException("A level has one front; its accessor makes others");
     SetGrid(GetWidth(), GetHeight(), oOther.GetTileWidth(), oOther.GetTileHeight());
     KeepMargins(oOther.GetXMargin(), oOther.GetYMargin(), oOther.GetMarginBehaviour());
-    if (detail::Bordered* const poBordered = mpoFront->GetBordered(*this))
+    if (ExactHaloReader* const poBordered = mpoFront->GetBordered(*this))
         poBordered->SetMargins(GetXMargin(), GetYMargin(), GetMarginBehaviour());
 }
 
@@ -368,7 +369,7 @@ void RasterCache::SetOptimalTileSize()
 
 void RasterCache::SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour)
 {
-    if (detail::Bordered* const poBordered = mpoFront->GetBordered(*this))
+    if (ExactHaloReader* const poBordered = mpoFront->GetBordered(*this))
         poBordered->SetMargins(nXMargin, nYMargin, eBehaviour);
     else
     {
@@ -423,12 +424,11 @@ void RasterCache::ReadRaster(Raster* poRaster)
     krv::gobs::CheckRasterCompatible(poRaster, this);
     if (poRaster->GetWidth() == 0 || poRaster->GetHeight() == 0)
         return;
-    detail::Bordered* const poBordered = mpoFront->GetBordered(*this);
-    if (poBordered != nullptr ? detail::Bordered::IsInside(*this, *poRaster)
-                              : IsClearOfBorder(*poRaster, GetWidth(), GetHeight()))
+    ExactHaloReader* const poBordered = mpoFront->GetBordered(*this);
+    if (poBordered != nullptr ? poBordered->IsInside(*poRaster) : IsClearOfBorder(*poRaster, GetWidth(), GetHeight()))
         return mpoFront->Read(AreaOf(*poRaster), poRaster->GetBuffer(), nullptr, mbPassing);
     if (poBordered != nullptr)
-        return poBordered->Read(*poRaster);
+        return poBordered->ReadRaster(poRaster);
     static_cast<void>(mpoFront->PassOn(*poRaster, GetMarginBehaviour(), false));
 }
 
@@ -440,9 +440,9 @@ bool RasterCache::HasValidity()
 std::unique_ptr<Mask> RasterCache::ReadValid(Raster& oRaster)
 {
     krv::gobs::CheckRasterCompatible(&oRaster, this);
-    detail::Bordered* const poBordered = mpoFront->GetBordered(*this);
-    const bool bInside = poBordered != nullptr ? detail::Bordered::IsInside(*this, oRaster)
-                                               : IsClearOfBorder(oRaster, GetWidth(), GetHeight());
+    ExactHaloReader* const poBordered = mpoFront->GetBordered(*this);
+    const bool bInside =
+        poBordered != nullptr ? poBordered->IsInside(oRaster) : IsClearOfBorder(oRaster, GetWidth(), GetHeight());
     if (!bInside && poBordered != nullptr)
         return poBordered->ReadValid(oRaster);
     if (!bInside && mpoImage->mbValidity)

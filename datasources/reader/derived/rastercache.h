@@ -1,7 +1,6 @@
 #pragma once
 
 #include "datasources/reader/derived/derivedreader.h"
-#include "datasources/reader/ivalidityreader.h"
 
 #include <cstdint>
 #include <functional>
@@ -40,7 +39,7 @@ struct CacheStatistics
 // each thread uses a front of its own. The source is read under a lock, or, when a factory makes one for each front,
 // without. A tile that several threads want is read once; who waits gets the exception of a failed reading, which
 // leaves nothing behind.
-class KRV_DATASOURCES_API RasterCache : public DerivedReader, public IValidityReader
+class KRV_DATASOURCES_API RasterCache : public DerivedReader
 {
 public:
     using Factory = std::function<std::unique_ptr<IRasterReader>()>;

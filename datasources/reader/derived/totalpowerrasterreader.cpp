@@ -29,12 +29,15 @@ namespace
 
 using krv::gobs::PowerTerm;
 
-AuxiliaryData PowerRecord(const AuxiliaryData& oSource, bool bValidity)
+// The square of the root of a mean of squares is a mean.
+std::string MethodOfSquares(const std::string& method)
 {
-    AuxiliaryData oRecord = detail::MakeConvertedRecord(oSource, 1);
-    MetadataMap oFileMap = oRecord.GetFileMetadata();
-    oFileMap.erase("Matrix_Type");
-    oRecord.SetFileMetadata(oFileMap);
+    return method == "RMS" ? "AVERAGE" : method;
+}
+
+AuxiliaryData PowerRecord(const AuxiliaryData& oSource, bool bValidity, bool bSquares)
+{
+    AuxiliaryData oRecord = detail::MakeConvertedRecord(oSource, 1, bSquares ? MethodOfSquares : nullptr);
     MetadataMap oMap = oRecord.GetChanMetadata(1);
     oMap["Matrix_Type"] = "Intensity";
     if (bValidity)
@@ -70,6 +73,12 @@ struct TotalPowerRasterReader::State
         : moTerms(oTerms), moSum(oSource.GetDataType(), oTerms), moValidity(oSource, krv::gobs::eAnyChannel)
     {
         moInfos.Add(std::make_unique<ChannelInfo>(moSum.GetResultType()));
+    }
+
+    bool HasSquares() const
+    {
+        return std::any_of(moTerms.begin(), moTerms.end(),
+                           [](const PowerTerm& oTerm) { return oTerm.meKind == PowerTerm::eSquare; });
     }
 
     std::vector<PowerTerm> moTerms;
@@ -176,7 +185,7 @@ const std::vector<IChannelInfo*>& TotalPowerRasterReader::GetChannelsInfo() cons
 
 AuxiliaryData TotalPowerRasterReader::GetAuxiliaryData() const
 {
-    return PowerRecord(GetSource().GetAuxiliaryData(), mpoState->moValidity.IsNeeded());
+    return PowerRecord(GetSource().GetAuxiliaryData(), mpoState->moValidity.IsNeeded(), mpoState->HasSquares());
 }
 
 IOverviewReaderAccessor* TotalPowerRasterReader::GetOverviewReaderAccessor()
@@ -185,8 +194,7 @@ IOverviewReaderAccessor* TotalPowerRasterReader::GetOverviewReaderAccessor()
     if (poLevels == nullptr)
         return nullptr;
     const std::vector<PowerTerm>& oTerms = mpoState->moTerms;
-    const bool bSquares = std::any_of(oTerms.begin(), oTerms.end(),
-                                      [](const PowerTerm& oTerm) { return oTerm.meKind == PowerTerm::eSquare; });
+    const bool bSquares = mpoState->HasSquares();
     ConvertedLevels oRules;
     oRules.mnChannels = 1;
     oRules.moWrap = [oTerms](std::unique_ptr<IRasterReader> poLevel)
@@ -197,9 +205,9 @@ IOverviewReaderAccessor* TotalPowerRasterReader::GetOverviewReaderAccessor()
     {
         return !bSquares || HoldsPower(GetLevelMethod(oBook, nLevel));
     };
-    oRules.moConvert = [bValidity = mpoState->moValidity.IsNeeded()](const AuxiliaryData& oRecord)
+    oRules.moConvert = [bSquares, bValidity = mpoState->moValidity.IsNeeded()](const AuxiliaryData& oRecord)
     {
-        return PowerRecord(oRecord, bValidity);
+        return PowerRecord(oRecord, bValidity, bSquares);
     };
     return new ConvertedOverviewReaderAccessor(std::move(poLevels), std::move(oRules));
 }

@@ -1,7 +1,6 @@
 #pragma once
 
 #include "datasources/reader/derived/derivedreader.h"
-#include "datasources/reader/ivalidityreader.h"
 
 #include <memory>
 #include <string>
@@ -50,7 +49,7 @@ struct PowerRequest
 // functions are the ways. Levels are those of the source that hold power: of intensities and matrices all, of
 // scattering elements and amplitudes those made by NEAREST or RMS, since the power of a mean is not the mean of power.
 // It shows no dataset: the values of its pixels are not those of one.
-class KRV_DATASOURCES_API TotalPowerRasterReader : public DerivedReader, public IValidityReader
+class KRV_DATASOURCES_API TotalPowerRasterReader : public DerivedReader
 {
 public:
     // The source outlives this reader unless bTakeOwnership says that it goes with it; on failure it stays the

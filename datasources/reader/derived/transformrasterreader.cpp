@@ -5,7 +5,7 @@
 #include "datasources/metadata/pixelstatistics.h"
 #include "datasources/metadata/typednodata.h"
 #include "datasources/reader/checkrastercompatible.h"
-#include "datasources/reader/derived/detail/bordered.h"
+#include "datasources/reader/exacthaloreader.h"
 #include "datasources/reader/readervalidity.h"
 #include "gobs/mask/exactmaskdecision.h"
 #include "gobs/mask/mask.h"
@@ -232,7 +232,7 @@ public:
         return oRecord;
     }
 
-    std::unique_ptr<detail::Bordered> mpoBordered;
+    std::unique_ptr<ExactHaloReader> mpoBordered; // over the reader itself, for rasters that reach outside
 
 private:
     // Throws for a method that nothing interpolates by.
@@ -513,7 +513,7 @@ TransformRasterReader::TransformRasterReader(IRasterReader* poSource, std::share
     mpoImplementation = std::make_unique<Implementation>(*poSource, std::move(poMap), oRequest);
     SetSource({poSource, {false}});
     TransformRasterReader::SetOptimalTileSize();
-    mpoImplementation->mpoBordered = std::make_unique<detail::Bordered>(*this);
+    mpoImplementation->mpoBordered = std::make_unique<ExactHaloReader>(this, false);
     OwnSource(bTakeOwnership);
 }
 
@@ -533,8 +533,8 @@ void TransformRasterReader::SetMargins(unsigned int nXMargin, unsigned int nYMar
 void TransformRasterReader::ReadRaster(Raster* poRaster)
 {
     krv::gobs::CheckRasterCompatible(poRaster, this);
-    if (!detail::Bordered::IsInside(*this, *poRaster))
-        return mpoImplementation->mpoBordered->Read(*poRaster);
+    if (!mpoImplementation->mpoBordered->IsInside(*poRaster))
+        return mpoImplementation->mpoBordered->ReadRaster(poRaster);
     const Part oPart{static_cast<long long>(poRaster->GetX()) - poRaster->GetXMargin(),
                      static_cast<long long>(poRaster->GetY()) - poRaster->GetYMargin(), poRaster->GetFullWidth(),
                      poRaster->GetFullHeight()};
@@ -550,7 +550,7 @@ bool TransformRasterReader::HasValidity()
 std::unique_ptr<Mask> TransformRasterReader::ReadValid(Raster& oRaster)
 {
     krv::gobs::CheckRasterCompatible(&oRaster, this);
-    if (!detail::Bordered::IsInside(*this, oRaster))
+    if (!mpoImplementation->mpoBordered->IsInside(oRaster))
         return mpoImplementation->mpoBordered->ReadValid(oRaster);
     const Part oPart{static_cast<long long>(oRaster.GetX()) - oRaster.GetXMargin(),
                      static_cast<long long>(oRaster.GetY()) - oRaster.GetYMargin(), oRaster.GetFullWidth(),

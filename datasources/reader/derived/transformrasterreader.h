@@ -1,7 +1,6 @@
 #pragma once
 
 #include "datasources/reader/derived/derivedreader.h"
-#include "datasources/reader/ivalidityreader.h"
 #include "gobs/resampling/resampling.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 
@@ -49,7 +48,7 @@ struct TransformRequest
 //
 // Margins of any width and behaviour are those of the whole result extended beyond its borders. There are no levels:
 // another request gives a smaller image. It shows no dataset: its pixels are not those of one.
-class KRV_DATASOURCES_API TransformRasterReader : public DerivedReader, public IValidityReader
+class KRV_DATASOURCES_API TransformRasterReader : public DerivedReader
 {
 public:
     // The source outlives this reader unless bTakeOwnership says that it goes with it; on failure it stays the

@@ -1,5 +1,6 @@
 #include "datasources/reader/detail/reducedvalidity.h"
 
+#include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/irasterdataset.h"
@@ -55,11 +56,16 @@ unsigned int BoxStart(unsigned int nPixel, unsigned int nSize, unsigned int nLev
 class LevelReader : public BasicReader
 {
 public:
-    LevelReader(IDataset& oDataset, std::unique_ptr<IRasterIO> poIO)
+    LevelReader(IDataset& oDataset, std::unique_ptr<IRasterIO> poIO,
+                std::unique_ptr<IOverviewManager> poManager = nullptr)
+        : mpoManager(std::move(poManager))
     {
         SetDataset(&oDataset, {1}, false);
         SetRasterIO(std::move(poIO), krv::gobs::eDT_8U);
     }
+
+private:
+    std::unique_ptr<IOverviewManager> mpoManager; // of the I/O
 };
 
 } // namespace
@@ -69,6 +75,22 @@ std::unique_ptr<const krv::gobs::IMaskBuilder> ZeroOrNaN(unsigned int nChannel)
     const krv::gobs::ExactMaskDecision oDecision(krv::gobs::eAnyChannel, {krv::gobs::SampleValue::FromUnsigned(0)},
                                                  {nChannel}, true);
     return std::make_unique<krv::gobs::MaskDecisionBuilder>(&oDecision);
+}
+
+std::unique_ptr<BasicReader> ReadStoredLevel(IDataset& oDataset, unsigned int nBitmap, unsigned int nWidth,
+                                             unsigned int nHeight)
+{
+    auto& oBitmaps = dynamic_cast<IBitmapDataset&>(oDataset);
+    std::unique_ptr<IOverviewManager> poManager(oBitmaps.GetBitmapOverviewManager());
+    for (const unsigned int nLevel : poManager != nullptr ? poManager->GetLevels() : std::vector<unsigned int>())
+    {
+        if (poManager->GetLevelWidth(nLevel) != nWidth || poManager->GetLevelHeight(nLevel) != nHeight ||
+            !poManager->IsValid(nBitmap, nLevel))
+            continue;
+        std::unique_ptr<IRasterIO> poIO(poManager->GetOverviewIO(nLevel, {nBitmap}));
+        return std::make_unique<LevelReader>(oDataset, std::move(poIO), std::move(poManager));
+    }
+    return nullptr;
 }
 
 std::unique_ptr<BasicReader> ReadReduced(IDataset& oDataset, std::unique_ptr<BasicReader> poFull, unsigned int nWidth,

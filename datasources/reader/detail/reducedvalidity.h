@@ -46,6 +46,10 @@ private:
     unsigned int mnFactor;
 };
 
+// A reader of the level of a bitmap that the dataset holds in that size; null when there is none that is up to date.
+std::unique_ptr<BasicReader> ReadStoredLevel(IDataset& oDataset, unsigned int nBitmap, unsigned int nWidth,
+                                             unsigned int nHeight);
+
 // A reader of it, with margins.
 std::unique_ptr<BasicReader> ReadReduced(IDataset& oDataset, std::unique_ptr<BasicReader> poFull, unsigned int nWidth,
                                          unsigned int nHeight);

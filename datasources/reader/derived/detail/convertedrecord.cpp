@@ -1,5 +1,6 @@
 #include "datasources/reader/derived/detail/convertedrecord.h"
 
+#include "datasources/metadata/levelbook.h"
 #include "datasources/metadata/pixelstatistics.h"
 
 namespace krv::datasources::detail
@@ -10,7 +11,7 @@ namespace
 
 constexpr const char* UNTRUE[] = {"NO_DATA_VALUE", "Scale",           "Offset",          "UnitType",   "ColorInterp",
                                   "Photometric",   "DEFAULT_PCT_REF", "DEFAULT_LUT_REF", "DefaultRed", "DefaultGreen",
-                                  "DefaultBlue",   "DefaultGray",     "AlphaKind"};
+                                  "DefaultBlue",   "DefaultGray",     "AlphaKind",       "Matrix_Type"};
 
 MetadataMap WithoutUntrue(MetadataMap oMap)
 {
@@ -20,9 +21,27 @@ MetadataMap WithoutUntrue(MetadataMap oMap)
     return oMap;
 }
 
+// All channels of the result are made of all of the source.
+void CopyBook(const AuxiliaryData& oSource, AuxiliaryData& oRecord, MethodOfLevels pMethod)
+{
+    const auto Name = [&](const std::string& method)
+    {
+        return pMethod != nullptr ? pMethod(method) : method;
+    };
+    RenameForeignMethod(oRecord, Name(GetLevelMethod(oRecord, 0)));
+    for (const unsigned int nLevel : GetBookedLevels(oSource))
+    {
+        bool bValid = true;
+        for (unsigned int n = 1; n <= oSource.GetChannelCount(); ++n)
+            bValid = bValid && IsLevelValid(oSource, n, nLevel);
+        for (unsigned int n = 1; n <= oRecord.GetChannelCount(); ++n)
+            SetLevelValid(oRecord, n, nLevel, bValid, Name(GetLevelMethod(oSource, nLevel)));
+    }
+}
+
 } // namespace
 
-AuxiliaryData MakeConvertedRecord(const AuxiliaryData& oSource, unsigned int nChannels)
+AuxiliaryData MakeConvertedRecord(const AuxiliaryData& oSource, unsigned int nChannels, MethodOfLevels pMethod)
 {
     const AuxiliaryData oClean = oSource.GetCleanedMeta();
     AuxiliaryData oRecord(nChannels);
@@ -31,6 +50,7 @@ AuxiliaryData MakeConvertedRecord(const AuxiliaryData& oSource, unsigned int nCh
         return oRecord;
     oRecord.SetChanMetadata(WithoutUntrue(oClean.GetChanMetadata(1)), 1);
     oRecord.SetChannelDescription(oClean.GetChannelDescription(1), 1);
+    CopyBook(oSource, oRecord, pMethod);
     return oRecord;
 }
 
