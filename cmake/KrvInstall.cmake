@@ -12,7 +12,7 @@ set_target_properties(krvpluginsupport PROPERTIES EXPORT_NAME pluginsupport)
 install(TARGETS krvpluginsupport EXPORT krvpluginsupportTargets ARCHIVE DESTINATION lib)
 install(EXPORT krvpluginsupportTargets NAMESPACE krv:: DESTINATION ${KRV_PACKAGE_DIR})
 
-foreach(folder toolkit gobs datasources operations plugins/support)
+foreach(folder toolkit gobs datasources operations krv plugins/support)
   install(DIRECTORY ${CMAKE_SOURCE_DIR}/${folder}/ DESTINATION include/krv/${folder}
           FILES_MATCHING PATTERN "*.h" PATTERN detail EXCLUDE)
 endforeach()

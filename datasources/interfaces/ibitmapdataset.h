@@ -28,15 +28,21 @@ public:
 
     // The numbers of the existing bitmaps, ascending.
     virtual std::vector<unsigned int> GetBitmapList() const = 0;
-    // A new 8-bit unsigned I/O object over the listed bitmaps, owned by the caller.
+    // A new 8-bit unsigned I/O object over the listed bitmaps, owned by the caller; the dataset outlives it. Throws
+    // DataException for a number that is not in the list.
     virtual IRasterIO* GetBitmapIO(const std::vector<unsigned int>& oBitmaps) = 0;
+    // Takes the bitmap and its levels out of the file; the others keep their numbers. Throws DataException for a number
+    // that is not in the list and for a dataset that is not open for updating, as the operations below do.
     virtual void DeleteBitmap(unsigned int nBitmap) = 0;
     // Adds a zone, all clear and with a description of the format's choice, and returns its number.
     virtual unsigned int CreateBitmap() = 0;
+    // Empty for a bitmap that says which pixels are valid. Throws DataException for a number that is not in the list.
     virtual std::string GetBitmapDescription(unsigned int nBitmap) const = 0;
     // Decides the kind of the bitmap as well; the pixels stay.
     virtual void SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription) = 0;
+    // The tags of the bitmap itself, empty when it has none. Throws DataException for a number that is not in the list.
     virtual MetadataMap GetBitmapMetadata(unsigned int nBitmap) const = 0;
+    // Replaces all tags of the bitmap. Throws DataException where the format has no place for them.
     virtual void SetBitmapMetadata(unsigned int nBitmap, const MetadataMap& oMetadata) = 0;
     // The levels of the bitmaps, with bitmap numbers for channels; a new object that the caller deletes, or null. A
     // format may have levels of the validity mask alone.

@@ -17,6 +17,8 @@ public:
 
     // The accepted channels, from 1, ascending.
     virtual std::vector<unsigned int> Accept(const IRasterDataset& oDataset) const = 0;
+    // Whether a channel (from 1) is accepted. The dataset is only asked. Throws DataException for a channel that does
+    // not exist.
     virtual bool Accept(const IRasterDataset& oDataset, unsigned int nChannel) const = 0;
 };
 

@@ -30,18 +30,26 @@ public:
     virtual IFileFormat* GetFileFormat() const = 0;
     // Removes the dataset's file or files.
     virtual FileAccessState Delete() = 0;
+    // Whether there is a file under the name, or, of a new one that has not got its name yet, whether its image is laid
+    // out. Synthetic datasets: whether they hold an image.
     virtual bool Exists() const = 0;
     // The file name, or a descriptive name for synthetic datasets.
     virtual std::string GetName() = 0;
+    // A record of its own, with as many channels as the image; empty where the format keeps none.
     virtual AuxiliaryData ReadAuxiliaryData() = 0;
+    // Replaces the whole record; the bookkeeping of levels stays the file's. Throws DataException for a dataset that is
+    // not open for updating and where the format has no place for what the record holds; the old one stays then.
     virtual void WriteAuxiliaryData(const AuxiliaryData& oData) = 0;
     // A new object owned by the caller, or null when the file names no reference system.
     virtual krv::ogc::cs::ICRS* ReadCRS() const = 0;
+    // Replaces the reference system; the argument is not kept. Throws DataException for a dataset that is not open for
+    // updating and for a system that the format cannot express.
     virtual void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const = 0;
     // Whether the pixels lie in other files.
     virtual bool IsLinked() const = 0;
     // Flushes pending changes to the file.
     virtual void Synchronize() = 0;
+    // True from the start until Close.
     virtual bool IsOpen() const = 0;
     // Only the destructor may follow.
     virtual void Close() = 0;

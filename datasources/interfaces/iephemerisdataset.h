@@ -21,7 +21,9 @@ public:
 
     // Non-zero when the dataset holds ephemeris data.
     virtual int HasEphemeris() const = 0;
+    // The numbers of the segments, ascending; empty when there are none.
     virtual std::vector<unsigned int> GetEphemerisList() const = 0;
+    // Throws DataException for a number that is not in the list and for a dataset that is not open for updating.
     virtual void DeleteEphemeris(unsigned int nSegment) = 0;
     // A new model from an ephemeris segment and a further segment (0: none), owned by the caller. Throws krv::Exception
     // when they make none.

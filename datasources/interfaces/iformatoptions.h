@@ -22,6 +22,7 @@ class KRV_DATASOURCES_API IFormatOptions
 public:
     virtual ~IFormatOptions();
 
+    // In the order in which they are told to people; empty for a format without options.
     virtual std::vector<FormatOption> ListOptions() const = 0;
 };
 

@@ -14,8 +14,12 @@ class KRV_DATASOURCES_API IHistoryIO
 public:
     virtual ~IHistoryIO();
 
+    // Empty when there is none.
     virtual std::vector<std::string> ReadHistory() const = 0;
+    // Adds an entry behind the others. Throws DataException for a dataset that is not open for updating; the history is
+    // as before then.
     virtual void AppendHistory(const std::string& oEntry) = 0;
+    // Takes all entries away. Throws the same.
     virtual void ClearHistory() = 0;
 };
 

@@ -32,12 +32,16 @@ public:
     virtual LookupTable GetLUT(unsigned int nLUT) const = 0;
     // The channel that the table belongs to, or 0.
     virtual unsigned int GetLUTChannel(unsigned int nLUT) const = 0;
+    // Empty when nobody gave one.
     virtual std::string GetLUTDescription(unsigned int nLUT) const = 0;
     // Stores a table for a channel (0: none) and returns its number. Throws DataException for a table whose values do
     // not ascend.
     virtual unsigned int CreateLUT(const LookupTable& oTable, unsigned int nChannel) = 0;
+    // Replaces the entries; number and channel stay. Throws what CreateLUT throws.
     virtual void UpdateLUT(unsigned int nLUT, const LookupTable& oTable) = 0;
+    // Throws DataException for a dataset that is not open for updating.
     virtual void SetLUTDescription(unsigned int nLUT, const std::string& oDescription) = 0;
+    // The other tables keep their numbers. Tags that refer to the table stay. Throws the same.
     virtual void DeleteLUT(unsigned int nLUT) = 0;
 };
 

@@ -13,11 +13,14 @@ class KRV_DATASOURCES_API IRasterIO
 public:
     virtual ~IRasterIO();
 
+    // The columns of the image, or of the level, in pixels.
     virtual unsigned int GetFileWidth() const = 0;
+    // The rows.
     virtual unsigned int GetFileHeight() const = 0;
 
-    // The block of pixels that the format transfers best; readers take it as their tile.
+    // The columns of the block of pixels that the format transfers best, at least 1; readers take it as their tile.
     virtual unsigned int GetTileWidth() const = 0;
+    // Its rows.
     virtual unsigned int GetTileHeight() const = 0;
 
     // Reads a part of a window whose origin may lie outside the image. The buffer holds nWidth * nHeight pixels; the
@@ -33,11 +36,13 @@ public:
     virtual void ReadWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
                             unsigned char* pBuffer) = 0;
 
-    // The counterparts: they store the part of the buffer, and the whole window. What is stored lies inside the image,
-    // else krv::DataException before anything is: nothing of it would be found again.
+    // The counterpart of the long form: stores the part of the buffer. All of it lies inside the image, else
+    // krv::DataException before anything is stored: nothing of it would be found again. The buffer stays the caller's
+    // and is not kept. Throws krv::DataException for a dataset that is not open for updating.
     virtual void WriteWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX,
                              unsigned int nPartY, unsigned int nPartWidth, unsigned int nPartHeight,
                              unsigned char* const pBuffer) = 0;
+    // Stores a whole window, under the same conditions.
     virtual void WriteWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,
                              unsigned char* const pBuffer) = 0;
 };

@@ -44,6 +44,7 @@ private:
     virtual std::size_t GetPixelBytes() const = 0;
     // A rectangle with pixels, inside the image; its row r lies at the pointer + r * nPitch bytes.
     virtual void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) = 0;
+    // The counterpart; it stores the rectangle before it returns, or throws.
     virtual void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) = 0;
 
     struct Transfer;

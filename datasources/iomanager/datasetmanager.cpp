@@ -7,6 +7,7 @@
 #include "datasources/iomanager/formatcapabilities.h"
 #include "toolkit/core/core.h"
 #include "toolkit/core/lettercase.h"
+#include "toolkit/exceptions/described.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/xml/xmlutil.h"
@@ -74,22 +75,12 @@ bool ReadHeader(int nFile, const struct stat& oStatus, Header& oHeader)
     return true;
 }
 
-// An exception whose message is an empty text by contract. what() names the file and the cause, for programs that show
-// no more than that.
+// The message is an empty text and the place none, by contract.
 template <typename Kind>
-class Described : public Kind
+krv::Described<Kind> Refusal(const std::string& fileName, const std::string& cause)
 {
-public:
-    Described(const std::string& fileName, const std::string& cause)
-        : Kind(fileName, "", krv::Place::None()), moDescription(fileName + ": " + cause)
-    {
-    }
-
-    const char* what() const noexcept override { return moDescription.c_str(); }
-
-private:
-    std::string moDescription;
-};
+    return krv::Described<Kind>(fileName + ": " + cause, fileName, "", krv::Place::None());
+}
 
 std::string WhyUnreadable(const std::string& name)
 {
@@ -233,8 +224,8 @@ IDataset* DatasetManager::OpenLocked(const std::string& fileName, AccessMode eMo
             return poDataset;
     }
     if (!bRead)
-        throw Described<krv::FileNotFoundException>(mungedName, WhyUnreadable(mungedName));
-    throw Described<krv::FileFormatException>(mungedName, "no format recognises it");
+        throw Refusal<krv::FileNotFoundException>(mungedName, WhyUnreadable(mungedName));
+    throw Refusal<krv::FileFormatException>(mungedName, "no format recognises it");
 }
 
 IDataset* DatasetManager::OpenRecognised(const std::string& name, const unsigned char* pHeader, AccessMode eMode,

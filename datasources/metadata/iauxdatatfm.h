@@ -16,6 +16,7 @@ class KRV_DATASOURCES_API IAuxDataTfm
 public:
     virtual ~IAuxDataTfm();
 
+    // The given record stays as it is. Any thread.
     virtual krv::datasources::AuxiliaryData Transform(const krv::datasources::AuxiliaryData& oData) const = 0;
 };
 

@@ -12,6 +12,7 @@ class KRV_DATASOURCES_API IMetaDataTfm
 public:
     virtual ~IMetaDataTfm();
 
+    // The given tags stay as they are. Any thread.
     virtual krv::datasources::MetadataMap Transform(const krv::datasources::MetadataMap& oMap) const = 0;
 };
 

@@ -36,8 +36,9 @@ public:
     // The record that holds the book.
     virtual const AuxiliaryData& GetBook() const = 0;
 
-    // These take the book as it is after them.
+    // Lays out the images of a level, all 0. oBook, here and below: the book as it is afterwards, to be stored with it.
     virtual void MakeLevel(const Level& oLevel, const AuxiliaryData& oBook, const Place& oPlace) = 0;
+    // Takes the images of a level out of the file.
     virtual void DropLevel(unsigned int nLevel, const AuxiliaryData& oBook, const Place& oPlace) = 0;
     // bValid: a level became valid, and is to become invalid with the next change of the image.
     virtual void WriteBook(const AuxiliaryData& oBook, bool bValid, const Place& oPlace) = 0;
@@ -73,6 +74,7 @@ public:
 private:
     // What messages begin with.
     virtual std::string GetImageName() const = 0;
+    // The size of the image that the levels are of, in pixels.
     virtual unsigned int GetImageWidth() const = 0;
     virtual unsigned int GetImageHeight() const = 0;
     // Throws DataException unless the dataset may be changed. pWhat: such as "overviews cannot be written".

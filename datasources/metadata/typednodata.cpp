@@ -129,6 +129,16 @@ std::string GetNoDataText(const AuxiliaryData& oMetadata, unsigned int nChannel)
     return text;
 }
 
+void SetTypedNoData(AuxiliaryData& oMetadata, const NoDataValue& oValue, unsigned int nChannel)
+{
+    oMetadata.SetChanMetadataValue(detail::NO_DATA_VALUE, oValue.GetText(), nChannel);
+}
+
+void SetFileNoData(AuxiliaryData& oMetadata, const NoDataValue& oValue)
+{
+    oMetadata.SetFileMetadataValue(detail::NO_DATA_VALUE, oValue.GetText());
+}
+
 std::optional<NoDataValue> GetTypedNoData(const AuxiliaryData& oMetadata, unsigned int nChannel)
 {
     const std::string text = GetNoDataText(oMetadata, nChannel);

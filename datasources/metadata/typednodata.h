@@ -2,6 +2,7 @@
 
 #include "datasources/api.h"
 #include "gobs/mask/maskdecision.h"
+#include "gobs/mask/samplematch.h"
 #include "gobs/mask/samplevalue.h"
 
 #include <optional>
@@ -26,6 +27,26 @@ KRV_DATASOURCES_API std::string GetNoDataText(const AuxiliaryData& oMetadata, un
 
 // The value of that text; nothing when there is none. Throws DataException for a text that ParseNoData does not take.
 KRV_DATASOURCES_API std::optional<NoDataValue> GetTypedNoData(const AuxiliaryData& oMetadata, unsigned int nChannel);
+
+// Records the value of a channel (from 1), which counts before the file's; SetFileNoData that of all channels without
+// one of their own. Throw OutOfBoundsException "Out of bounds.".
+KRV_DATASOURCES_API void SetTypedNoData(AuxiliaryData& oMetadata, const NoDataValue& oValue, unsigned int nChannel);
+KRV_DATASOURCES_API void SetFileNoData(AuxiliaryData& oMetadata, const NoDataValue& oValue);
+
+// The same as a number of the program's: 8- to 64-bit integers, float or double. NaN and 64-bit integers are exact.
+template <class Number>
+void SetNoData(AuxiliaryData& oMetadata, Number nValue, unsigned int nChannel)
+{
+    SetTypedNoData(oMetadata, NoDataValue::From(nValue), nChannel);
+}
+// The sample of that type that equals the channel's value; nothing when there is no value, or when no sample can equal
+// it: then no pixel of the type is no-data by its value. Throws what GetTypedNoData throws.
+template <class Number>
+std::optional<Number> GetNoData(const AuxiliaryData& oMetadata, unsigned int nChannel)
+{
+    const std::optional<NoDataValue> oValue = GetTypedNoData(oMetadata, nChannel);
+    return oValue ? krv::gobs::ToSample<Number>(*oValue) : std::nullopt;
+}
 
 // As GetNoDataMaskBuilder, from these values: exact for integers of 64 bits, and for NaN. On request NaN samples of the
 // channels that have a value count as no-data beside it.

@@ -3,6 +3,7 @@
 #include "datasources/reader/rasteraccess.h"
 #include "toolkit/exceptions/place.h"
 
+#include <initializer_list>
 #include <memory>
 #include <string>
 #include <vector>
@@ -17,12 +18,13 @@ class IDataset;
 class IRasterDataset;
 class IRasterIO;
 
-// Serves the selected channels of one dataset as a grid of tiles with margins. All channels have one data type; which
-// lists of channels can be read together is the dataset's to say. Pixels go straight from the format into the raster.
+// Serves the selected channels of one dataset as a grid of tiles with margins. Some margins are made up, although the
+// image has pixels there: a side of a tile whose margin ends exactly at the right or bottom edge of the image, or lies
+// partly outside, is made as a whole from the pixels of the tile itself (FillRasterMargins), intended. Tiles beside the
+// last ones so get wrong edges under filters and other work on neighbourhoods, for which there is ExactHaloReader.
 //
-// Margins are read from the file where a whole side of them lies inside it, and otherwise made from the pixels of the
-// raster by FillRasterMargins: a margin that ends exactly at the right or bottom edge, or lies partly outside, is made
-// as a whole.
+// All channels have one data type; which lists of channels can be read together is the dataset's to say. Pixels go
+// straight from the format into the raster.
 class KRV_DATASOURCES_API BasicReader : public RasterAccess
 {
 public:
@@ -30,6 +32,11 @@ public:
     explicit BasicReader(const std::string& fileName);
     // The channels of a file, from 1, in this order; an empty list is all of them. Failures pass as they are.
     BasicReader(const std::string& fileName, const std::vector<unsigned int>& oChannels);
+    // The same for a list in place, the empty one too.
+    BasicReader(const std::string& fileName, std::initializer_list<unsigned int> oChannels)
+        : BasicReader(fileName, std::vector<unsigned int>(oChannels))
+    {
+    }
     // The channels that a filter accepts.
     BasicReader(const std::string& fileName, const IChannelFilter& oFilter);
     // Bitmaps as 8-bit channels of 0 and 1; an empty list is all of them. With bTakeOwnership the reader deletes the

@@ -17,12 +17,16 @@ class KRV_DATASOURCES_API IOverviewAccessor
 public:
     virtual ~IOverviewAccessor();
 
+    // Those of any channel of the file, valid or not; empty when there are none.
     virtual std::vector<unsigned int> GetLevels() const = 0;
+    // Whether a channel has the level and its pixels are up to date. Throws OutOfBoundsException for a position outside
+    // the list; a level that does not exist is false.
     virtual bool IsValid(unsigned int nChannel, unsigned int nLevel) const = 0;
-    // Whether every channel of the list has the level.
+    // Whether every channel of the list has the level, up to date.
     virtual bool IsLevelValid(unsigned int nLevel) const = 0;
     // The level's file metadata, and the metadata of each channel of the list.
     virtual AuxiliaryData GetAuxiliaryData(unsigned int nLevel) = 0;
+    // The length of the list.
     virtual unsigned int GetChanCount() const = 0;
 };
 

@@ -31,8 +31,11 @@ public:
     // The margins of rasters that are made from now on, in pixels. Margins of more than half the image are accepted
     // with eReplicate alone, else DataException; the behaviour is stored even then.
     virtual void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour) = 0;
+    // The columns of the margin on each side, in pixels; 0 until they are set.
     virtual unsigned int GetXMargin() const = 0;
+    // The rows of the margin above and below.
     virtual unsigned int GetYMargin() const = 0;
+    // How margins beyond the image are made; eMirror until it is set.
     virtual eMarginBehaviour GetMarginBehaviour() const = 0;
     // Fills the caller's raster: its own position, size and margins say which pixels. Channel count and type are those
     // of the reader, else DataException before anything is read. Contents are undefined after an exception.
@@ -50,9 +53,13 @@ public:
     virtual krv::ogc::cs::GeocodingInfo* GetGeocodingInfo() const = 0;
     // A new object owned by the caller, or null. The reader's dataset outlives it.
     virtual IOverviewReaderAccessor* GetOverviewReaderAccessor() = 0;
+    // The columns of the image, in pixels.
     virtual unsigned int GetWidth() const = 0;
+    // The rows of the image.
     virtual unsigned int GetHeight() const = 0;
+    // The channels of every raster.
     virtual unsigned int GetChansCount() const = 0;
+    // The type of every raster, which need not be that of the file. Lives as long as the reader.
     virtual const krv::gobs::DataType& GetDataType() const = 0;
 };
 

@@ -17,6 +17,7 @@
 #include "datasources/writer/basicoverviewwriteraccessor.h"
 #include "gobs/raster/raster.h"
 #include "toolkit/core/core.h"
+#include "toolkit/exceptions/described.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <utility>
@@ -305,7 +306,11 @@ void BasicWriter::CreateNewFile(const krv::gobs::RasterInfo& oInfo)
     IDataset* const poDataset = GetDataset();
     auto& oRasterDataset = RequireFacet<IRasterDataset>(
         poDataset, "Format does not support rasters: format=" + FormatName(*poDataset), oPlace);
-    Require(!poDataset->Exists(), "The dataset already exists", oPlace);
+    if (poDataset->Exists())
+    {
+        constexpr char MESSAGE[] = "The dataset already exists";
+        throw krv::Described<krv::DataException>(poDataset->GetName() + ": " + MESSAGE, MESSAGE, oPlace);
+    }
     const std::vector<unsigned int>& oChannels = GetChannels();
     Require(oChannels.empty() || oChannels.size() == oInfo.GetChansCount(),
             "The RasterInfo does not match the write channels of this writer", oPlace);

@@ -4,6 +4,7 @@
 #include "datasources/writer/irasterwriter.h"
 #include "toolkit/exceptions/place.h"
 
+#include <initializer_list>
 #include <string>
 #include <vector>
 
@@ -27,6 +28,11 @@ public:
     explicit BasicWriter(const std::string& fileName);
     // Channels of an existing file, from 1; an empty list is all of them.
     BasicWriter(const std::string& fileName, const std::vector<unsigned int>& oChannels);
+    // The same for a list in place, the empty one too.
+    BasicWriter(const std::string& fileName, std::initializer_list<unsigned int> oChannels)
+        : BasicWriter(fileName, std::vector<unsigned int>(oChannels))
+    {
+    }
     // Channels of an existing file, or of a new one in a format, whose image CreateNewFile lays out. A new file takes
     // its name only when nobody took it meanwhile: CreateNewFile and Synchronize throw IOException then. For a file
     // that replaces another as a whole see ReplacingWriter.

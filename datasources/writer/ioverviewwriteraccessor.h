@@ -20,7 +20,10 @@ public:
     virtual IRasterWriter* CreateRasterWriter(unsigned int nLevel) = 0;
     // Lays out a level for all channels of the file.
     virtual void CreateLevel(unsigned int nLevel) = 0;
+    // Says whether a channel of a level is up to date. Throws OutOfBoundsException for a position outside the list,
+    // DataException for an unknown level and a dataset that is not open for updating.
     virtual void SetValid(unsigned int nChannel, unsigned int nLevel, bool bValid) = 0;
+    // The same for every channel of the list.
     virtual void SetLevelValid(unsigned int nLevel, bool bValid) = 0;
     // NEAREST, AVERAGE, MODE, BILINEAR, CUBIC, LANCZOS, RMS, MIN, MAX or NONE, in any letter case.
     virtual void SetResamplingName(const std::string& oName) = 0;

@@ -22,6 +22,7 @@ public:
     // Stores the raster's centre at the raster's position; margins never reach the file, and nothing is clipped here.
     // Channel count and type are those of the writer, else DataException before anything is written.
     virtual void WriteRaster(const krv::gobs::Raster* poRaster) = 0;
+    // Whether there is an image to write to: a file under the name, or a new one from CreateNewFile on.
     virtual bool FileExists() = 0;
     // Lays out the image of a new file. Throws DataException when the file has one already and when the channel count
     // differs from the writer's list.

@@ -4,6 +4,7 @@
 #include "gobs/raster/datatype.h"
 
 #include <cstdint>
+#include <initializer_list>
 #include <memory>
 #include <optional>
 #include <string>
@@ -51,6 +52,11 @@ public:
     explicit MultiTypeWriter(const std::string& fileName, const MixedTypes& oTypes = {});
     MultiTypeWriter(const std::string& fileName, const std::vector<unsigned int>& oChannels,
                     const MixedTypes& oTypes = {});
+    MultiTypeWriter(const std::string& fileName, std::initializer_list<unsigned int> oChannels,
+                    const MixedTypes& oTypes = {})
+        : MultiTypeWriter(fileName, std::vector<unsigned int>(oChannels), oTypes)
+    {
+    }
     MultiTypeWriter(const std::string& fileName, const std::vector<unsigned int>& oChannels, const std::string& format,
                     const std::string& options, const MixedTypes& oTypes = {});
     MultiTypeWriter(const std::string& fileName, const IChannelFilter& oFilter, const MixedTypes& oTypes = {});

@@ -1,10 +1,5 @@
 // Reads three channels tile by tile, each tile with 8 pixels of its neighbours around it.
-#include "datasources/metadata/auxiliarydata.h"
-#include "datasources/reader/basicreader.h"
-#include "datasources/reader/rasterrange.h"
-#include "toolkit/exceptions/exceptions.h"
-#include "toolkit/ogc/cs/geocodinginfo.h"
-#include "toolkit/ogc/cs/icrs.h"
+#include <krv/krv.h>
 
 #include <exception>
 #include <iostream>
@@ -12,42 +7,35 @@
 int main(int nArguments, char** pArguments)
 try
 {
-    krv::datasources::BasicReader oReader(nArguments > 1 ? pArguments[1] : "scene.tif", {1, 2, 3});
-    oReader.SetTileSize(512, 512);
-    oReader.SetMargins(8, 8, eMirror);
+    // The margins are those of the image wherever they lie inside, whatever the tiles; beyond its borders mirrored.
+    const auto poReader = krv::OpenHaloReader(nArguments > 1 ? pArguments[1] : "scene.tif", {1, 2, 3}, 8, krv::eMirror);
+    poReader->SetTileSize(512, 512);
 
-    unsigned long long nSum = 0, nPixels = 0;
-    for (const std::unique_ptr<krv::gobs::Raster> oTile : krv::datasources::RasterRange(oReader))
+    double nSum = 0;
+    std::uint64_t nPixels = 0;
+    for (const std::unique_ptr<krv::Raster> poTile : krv::RasterRange(*poReader))
     {
-        nPixels += oTile->GetFullWidth() * oTile->GetFullHeight();
-        for (std::uint64_t n = 0; n < oTile->GetBufferSize(); ++n)
-            nSum += oTile->GetBuffer()[n];
+        const krv::RasterView<const std::uint8_t> oValues(*poTile); // throws for a file of another type
+        const auto nLastRow = static_cast<std::ptrdiff_t>(poTile->GetHeight() + poTile->GetYMargin());
+        for (std::ptrdiff_t nRow = -8; nRow < nLastRow; ++nRow)
+            for (const std::uint8_t nValue : oValues.GetFullRow(nRow)) // the channels of a pixel side by side
+                nSum += nValue;
+        nPixels += poTile->GetFullWidth() * poTile->GetFullHeight();
     }
-    std::cout << oReader.GetWidth() << " x " << oReader.GetHeight() << " pixels in " << oReader.GetTileCount()
+    std::cout << poReader->GetWidth() << " x " << poReader->GetHeight() << " pixels in " << poReader->GetTileCount()
               << " tiles; " << nPixels << " pixels with margins, sum " << nSum << "\n";
 
-    const krv::datasources::AuxiliaryData oTags = oReader.GetAuxiliaryData();
+    const krv::AuxiliaryData oTags = poReader->GetAuxiliaryData();
     for (const auto& [key, value] : oTags.GetFileMetadata())
         std::cout << key << " = " << value << "\n";
-    const std::unique_ptr<krv::ogc::cs::ICRS> oSystem(oReader.GetCRS());
-    const std::unique_ptr<krv::ogc::cs::GeocodingInfo> oGround(oReader.GetGeocodingInfo());
-    if (oSystem && oGround)
-        std::cout << oSystem->GetName() << ", " << oGround->GetColumnSpacing() << " " << oSystem->GetUnitName()
+    const auto poSystem = krv::GetCRS(*poReader);
+    const auto oGround = krv::GetGeocoding(*poReader);
+    if (poSystem && oGround)
+        std::cout << poSystem->GetName() << ", " << oGround->GetColumnSpacing() << " " << poSystem->GetUnitName()
                   << " per pixel, from " << oGround->GetXOffset() << " " << oGround->GetYOffset() << "\n";
-}
-catch (const krv::FileNotFoundException& oError)
-{
-    std::cerr << "readtiles: there is no file " << oError.GetFileName() << "\n";
-    return 1;
-}
-catch (const krv::FileException& oError)
-{
-    // The manager itself says no more than that no format takes the file: the message is empty then.
-    std::cerr << "readtiles: " << oError.GetFileName() << " cannot be read. " << oError.GetMessage() << "\n";
-    return 1;
 }
 catch (const std::exception& oError)
 {
-    std::cerr << "readtiles: " << oError.what() << "\n";
+    std::cerr << "readtiles: " << oError.what() << "\n"; // names the file and the cause
     return 1;
 }

@@ -35,6 +35,7 @@ class KRV_GOBS_API IMaskDecision
 public:
     virtual ~IMaskDecision();
 
+    // A new, independent object that the caller owns.
     virtual IMaskDecision* Clone() const = 0;
     // A new implementation for rasters of a type and channel count, owned by the caller.
     virtual IMaskDecisionImpl* GetImpl(const DataType& oType, unsigned long long nChannels) const = 0;

@@ -4,6 +4,7 @@
 
 #include <cstdint>
 #include <string>
+#include <type_traits>
 
 namespace krv::gobs
 {
@@ -23,6 +24,18 @@ public:
     static SampleValue FromUnsigned(std::uint64_t nValue);
     static SampleValue FromSigned(std::int64_t nValue);
     static SampleValue FromReal(double nValue);
+    // By the type of a number: integers of any width, float or double.
+    template <class Number>
+    static SampleValue From(Number nValue)
+    {
+        static_assert(std::is_arithmetic_v<Number>);
+        if constexpr (std::is_floating_point_v<Number>)
+            return FromReal(nValue);
+        else if constexpr (std::is_signed_v<Number>)
+            return FromSigned(nValue);
+        else
+            return FromUnsigned(nValue);
+    }
 
     eKind GetKind() const { return meKind; }
     bool IsNaN() const { return meKind == eReal && mnReal != mnReal; }

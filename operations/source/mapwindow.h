@@ -2,6 +2,7 @@
 
 #include "operations/api.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
+#include "toolkit/ogc/cs/mapwindow.h"
 
 #include <optional>
 #include <string>
@@ -11,23 +12,9 @@ namespace krv::operations
 
 class SourceFile;
 
-// A rectangle of pixels.
-struct PixelWindow
-{
-    unsigned int x = 0;
-    unsigned int y = 0;
-    unsigned int width = 0;
-    unsigned int height = 0;
-};
-
-// A rectangle in the map coordinates of a file's own reference system.
-struct MapBounds
-{
-    double west = 0;
-    double south = 0;
-    double east = 0;
-    double north = 0;
-};
+using krv::ogc::cs::MapBounds;
+using krv::ogc::cs::OutlineOf;
+using krv::ogc::cs::PixelWindow;
 
 // Which part of a file's image a user means: pixels, map coordinates, or where another file lies. At most one of them.
 struct WindowRequest
@@ -39,9 +26,6 @@ struct WindowRequest
 
 // The transform of a file. Throws RequestException for a file without one: with the identity, which says nothing.
 KRV_OPERATIONS_API krv::ogc::cs::GeocodingInfo RequireGeocoding(const SourceFile& oFile);
-
-// The smallest rectangle that holds the image of so many pixels.
-KRV_OPERATIONS_API MapBounds OutlineOf(const krv::ogc::cs::GeocodingInfo& oInfo, double nWidth, double nHeight);
 
 // Where another file lies. Throws RequestException when both have reference systems that differ.
 KRV_OPERATIONS_API MapBounds BoundsLike(const SourceFile& oFile, const SourceFile& oOther);

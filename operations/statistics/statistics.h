@@ -54,6 +54,7 @@ public:
     // first, or null when all are valid.
     virtual void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride,
                      const unsigned char* pValid = nullptr) = 0;
+    // Of all values so far; more may be added afterwards. Number and no-data text are left to the caller.
     virtual ChannelStatistics Get() const = 0;
     // Adds what another one, of the same type, has gathered. The result depends on the order, in the last digits of
     // reals alone.

@@ -5,7 +5,7 @@ cd "$(dirname "${BASH_SOURCE[0]}")/../.."
 
 # Releases of the tool differ in detail; this one is the measure.
 FORMATTER=${CLANG_FORMAT:-clang-format-14}
-mapfile -d '' oFiles < <(find toolkit gobs datasources operations plugins tools tests fuzz examples benchmarks \
+mapfile -d '' oFiles < <(find toolkit gobs datasources operations krv plugins tools tests fuzz examples benchmarks \
     -type f \( -name '*.h' -o -name '*.cpp' \) -print0 2>/dev/null)
 [ "${#oFiles[@]}" -gt 0 ] || { echo "no source files found" >&2; exit 1; }
 "$FORMATTER" --dry-run -Werror "${oFiles[@]}" 2>&1 | sed -n 's/^\([^ :]*\):[0-9]*:[0-9]*: error: code should.*/\1/p' | sort -u >&2

@@ -41,42 +41,74 @@ fi
 quietly scene "$oHome/bin/krv-samplescene" "$oWork" --size 600
 expect "600 x 600" "$oHome/bin/krv" info "$oWork/rgb.tif"
 
-cp -r "$oSource/examples/readtiles" "$oWork/readtiles"
-quietly configure cmake -S "$oWork/readtiles" -B "$oWork/program" -G Ninja -DCMAKE_CXX_COMPILER="$oCompiler" \
-    -DCMAKE_PREFIX_PATH="$oHome"
-quietly program cmake --build "$oWork/program"
-expect "600 x 600 pixels in 4 tiles; 399424 pixels with margins" "$oWork/program/readtiles" "$oWork/rgb.tif"
-
-expect "AREA_NAME = Sample scene" "$oWork/program/readtiles" "$oWork/rgb.tif"
-expect "UTM zone 19S, 10 metre per pixel" "$oWork/program/readtiles" "$oWork/rgb.tif"
-if "$oWork/program/readtiles" "$oWork/missing.tif" >"$oWork/missing.log" 2>&1 || ! grep -q missing.tif "$oWork/missing.log"; then
-    echo "a missing file is not named: $(cat "$oWork/missing.log")" >&2
+# Each example is a program of a stranger, and none is longer than a page.
+cp -r "$oSource/examples" "$oWork/examples"
+if wc -l "$oWork"/examples/*/main.cpp | awk '$2 != "total" && $1 > 60' | grep .; then
+    echo "these examples are too long" >&2
     exit 1
 fi
-
-cp -r "$oSource/examples/writetiles" "$oWork/writetiles"
-quietly configure cmake -S "$oWork/writetiles" -B "$oWork/writer" -G Ninja -DCMAKE_CXX_COMPILER="$oCompiler" \
+quietly configure cmake -S "$oWork/examples" -B "$oWork/programs" -G Ninja -DCMAKE_CXX_COMPILER="$oCompiler" \
     -DCMAKE_PREFIX_PATH="$oHome"
-quietly writer cmake --build "$oWork/writer"
-expect "turned.tif has 4 tiles" "$oWork/writer/writetiles" "$oWork/rgb.tif" "$oWork/turned.tif"
-expect "600 x 600" "$oHome/bin/krv" info "$oWork/turned.tif"
-if "$oWork/writer/writetiles" "$oWork/rgb.tif" "$oWork/turned.tif" >"$oWork/taken.log" 2>&1; then
-    echo "a file that is there is written over" >&2
-    exit 1
-fi
+quietly programs cmake --build "$oWork/programs" -j 2
+cd "$oWork"
 
-cp -r "$oSource/examples/filterscene" "$oWork/filterscene"
-quietly configure cmake -S "$oWork/filterscene" -B "$oWork/filter" -G Ninja -DCMAKE_CXX_COMPILER="$oCompiler" \
-    -DCMAKE_PREFIX_PATH="$oHome"
-quietly filter cmake --build "$oWork/filter"
-quietly filtered "$oWork/filter/filterscene" "$oWork/rgb.tif" "$oWork/smooth.tif"
-expect "600 x 600" "$oHome/bin/krv" info "$oWork/smooth.tif"
+# example NAME ARGUMENT...
+example()
+{
+    local oName=$1
+    shift
+    "$oWork/programs/$oName/$oName" "$@"
+}
 
+# refused TEXT COMMAND...: fails, and says why.
+refused()
+{
+    local oText=$1
+    shift
+    if "$@" >"$oWork/refused.log" 2>&1 || ! grep -qF "$oText" "$oWork/refused.log"; then
+        echo "not refused with \"$oText\": $*: $(cat "$oWork/refused.log")" >&2
+        exit 1
+    fi
+}
+
+expect "600 x 600 pixels in 4 tiles; 399424 pixels with margins" example readtiles rgb.tif
+expect "AREA_NAME = Sample scene" example readtiles rgb.tif
+expect "UTM zone 19S, 10 metre per pixel" example readtiles rgb.tif
+refused "missing.tif: No such file" example readtiles missing.tif
+expect "hill.tif is written" example newfile hill.tif
+for oText in "1000 x 1000" "no-data -9999" "500 x 500" "UTM zone 19S" "height in metres"; do
+    expect "$oText" "$oHome/bin/krv" info hill.tif
+done
+expect " 785349 " "$oHome/bin/krv" stats hill.tif # the pixels within 500 of the middle
+refused "hill.tif: The dataset already exists" example newfile hill.tif
+quietly filtered example filterscene rgb.tif smooth.tif
+expect "600 x 600" "$oHome/bin/krv" info smooth.tif
+cp rgb.tif edited.tif
+expect "me
+edited channel, no-data 7.5" example editmetadata edited.tif 7.5
+expect "Sample scene" "$oHome/bin/krv" info edited.tif
+expect "grid.tif has 1000 x 1000 pixels" example togrid rgb.tif hill.tif grid.tif
+expect "500000" "$oHome/bin/krv" info grid.tif
+cp rgb.tif masked.tif
+nValid=$(example validity masked.tif 0 | grep -o '^[0-9]*')
+nBright=$(example validity masked.tif 60 | grep -o '^[0-9]*')
+[ "$nValid" -eq 360000 ] && [ "$nBright" -gt 0 ] && [ "$nBright" -lt 360000 ]
+expect "\"valid\": $nBright" "$oHome/bin/krv" stats --json masked.tif
+expect "channel 3 (8U): mean" example channelstats rgb.tif
+
+# The page of answers and the program of the README hold what they say; flags come as a makefile asks for them.
 export PKG_CONFIG_PATH=$oHome/lib/pkgconfig
-# shellcheck disable=SC2046 # the flags are several words
-quietly pkgconfig "$oCompiler" -std=c++20 "$oWork/readtiles/main.cpp" -o "$oWork/readtiles/plain" \
-    $(pkg-config --cflags --libs krvdatasources) -Wl,-rpath,"$oHome/lib"
-expect "4 tiles" "$oWork/readtiles/plain" "$oWork/rgb.tif"
+cp rgb.tif scene.tif
+awk -v wanted=20 -f "$oSource/tests/structure/howto.awk" "$oSource/docs/howto.md" >answers.cpp
+awk '/^```cpp/ { inside = 1; next } /^```/ { inside = 0 } inside' "$oSource/README.md" >readme.cpp
+echo 'void Work(const krv::Raster&) {}' >>readme.cpp
+for oProgram in answers readme; do
+    # shellcheck disable=SC2046 # the flags are several words
+    quietly pkgconfig "$oCompiler" -std=c++20 "$oProgram.cpp" -o "$oProgram" \
+        $(pkg-config --cflags --libs krvdatasources) -Wl,-rpath,"$oHome/lib"
+    quietly "$oProgram.run" "./$oProgram"
+done
+expect "20 answers hold" cat answers.run.log
 # shellcheck disable=SC2046
 quietly jobs "$oCompiler" -std=c++20 "$oSource/examples/channelstats/main.cpp" -o "$oWork/channelstats" \
     $(pkg-config --cflags --libs krvoperations) -Wl,-rpath,"$oHome/lib"

@@ -11,6 +11,7 @@ BEGIN {
         rank[order[n]] = n + 0; # the subscripts of an array are texts
     rank["datasources/formatregistrar"] = rank["datasources/datasets"];
     rank["datasources/mosaic"] = rank["datasources/writer"];
+    rank["krv"] = rank["operations"]; # what a program of pixels includes; it needs no library of jobs
 
     # The two sources that look up.
     upward["datasources/iomanager/datasetmanager.cpp", "datasources/formatregistrar"] = 1;
@@ -45,7 +46,7 @@ BEGIN {
 function folder(path,    parts, count)
 {
     count = split(path, parts, "/");
-    if (parts[1] == "toolkit" || parts[1] == "gobs" || parts[1] == "operations")
+    if (parts[1] == "toolkit" || parts[1] == "gobs" || parts[1] == "operations" || parts[1] == "krv")
         return parts[1];
     return count < 2 ? parts[1] : parts[1] "/" parts[2];
 }
@@ -91,10 +92,10 @@ function checkOwn(target)
         complain("no such file from the root: " target);
     close(root "/" target);
     if (match(target, /(^|\/)detail\//)) {
-        owner = target ~ /^(toolkit|gobs|datasources|operations)\// ? substr(target, 1, index(target, "/")) : substr(target, 1, RSTART);
+        owner = target ~ /^(toolkit|gobs|datasources|operations|krv)\// ? substr(target, 1, index(target, "/")) : substr(target, 1, RSTART);
         if (index(FILENAME, owner) != 1)
             complain(target " is private to " owner);
-        else if (FILENAME ~ /\.h$/ && FILENAME !~ /\/detail\// && FILENAME ~ /^(toolkit|gobs|datasources|operations)\//)
+        else if (FILENAME ~ /\.h$/ && FILENAME !~ /\/detail\// && FILENAME ~ /^(toolkit|gobs|datasources|operations|krv)\//)
             complain("a public header does not include the private " target);
     }
 }
@@ -117,7 +118,7 @@ function checkForeign(target,    library)
             continue;
         if (FILENAME !~ home[library])
             complain("<" target "> is not for this folder");
-        else if (FILENAME ~ /\.h$/ && FILENAME !~ /\/detail\// && FILENAME ~ /^(toolkit|gobs|datasources|operations)\// &&
+        else if (FILENAME ~ /\.h$/ && FILENAME !~ /\/detail\// && FILENAME ~ /^(toolkit|gobs|datasources|operations|krv)\// &&
                  !(FILENAME in mayShow))
             complain("a public header does not show <" target ">");
     }

@@ -4,5 +4,5 @@ set -euo pipefail
 oHere=$(cd "$(dirname "${BASH_SOURCE[0]}")" && pwd)
 cd "${1:-$oHere/../..}"
 
-mapfile -d '' oFiles < <(find toolkit gobs datasources operations plugins tools -type f \( -name '*.h' -o -name '*.cpp' \) -print0 | sort -z)
+mapfile -d '' oFiles < <(find toolkit gobs datasources operations krv plugins tools -type f \( -name '*.h' -o -name '*.cpp' \) -print0 | sort -z)
 LC_ALL=C awk -v root=. -f "$oHere/layering.awk" "${oFiles[@]}"

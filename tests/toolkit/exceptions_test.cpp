@@ -1,3 +1,4 @@
+#include "toolkit/exceptions/exceptions.h"
 #include "toolkit/exceptions/place.h"
 
 #include <gtest/gtest.h>
@@ -14,4 +15,17 @@ TEST(Place, SourceFilesAreNamedFromTheRootOfTheTreeWhereverItLies)
     EXPECT_EQ(SourceFileText("/a/plugins/tif/my-plugins/page.cpp"), "plugins/tif/my-plugins/page");
     EXPECT_EQ(SourceFileText("../../operations/copy/conversion.cpp"), "operations/copy/conversion");
     EXPECT_EQ(SourceFileText("/a/b/page.cpp"), "/a/b/page");
+}
+
+TEST(Exceptions, AreMadeFromTextsAsTheyAre)
+{
+    const krv::IOException oFailure("a.tif", "disk full", "void Peer::Write()", "/peer/write.cpp", 12);
+    EXPECT_STREQ(oFailure.what(), "disk full");
+    EXPECT_EQ(oFailure.GetFileName(), "a.tif");
+    EXPECT_EQ(oFailure.GetFunction(), "void Peer::Write()");
+    EXPECT_EQ(oFailure.GetSourceFile(), "/peer/write.cpp");
+    EXPECT_EQ(oFailure.GetLine(), 12u);
+    const krv::LibraryException oLibrary("x.so", krv::LibraryException::eVersionMismatch, "old", "", "", 0);
+    EXPECT_EQ(oLibrary.GetType(), 3);
+    EXPECT_EQ(oLibrary.GetLine(), 0u);
 }

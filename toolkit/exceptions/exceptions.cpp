@@ -9,6 +9,12 @@ Exception::Exception(const std::string& message, const Place& oPlace)
 {
 }
 
+Exception::Exception(const std::string& message, const std::string& function, const std::string& sourceFile,
+                     unsigned int nLine)
+    : moMessage(message), moFunction(function), moSourceFile(sourceFile), mnLine(nLine)
+{
+}
+
 Exception::Exception(const Exception&) = default;
 Exception& Exception::operator=(const Exception&) = default;
 Exception::~Exception() = default;
@@ -61,6 +67,62 @@ LibraryException::LibraryException(const std::string& libraryFile, int nType, co
 OutOfBoundsException::OutOfBoundsException(const std::vector<unsigned int>& oIndices, const std::string& message,
                                            const Place& oPlace)
     : Exception(message, oPlace), moIndices(oIndices)
+{
+}
+
+DataException::DataException(const std::string& message, const std::string& function, const std::string& sourceFile,
+                             unsigned int nLine)
+    : Exception(message, function, sourceFile, nLine)
+{
+}
+
+ParameterException::ParameterException(const std::string& message, int nType, const std::string& parameter,
+                                       const std::string& function, const std::string& sourceFile, unsigned int nLine)
+    : Exception(message, function, sourceFile, nLine), mnType(nType), moParameter(parameter)
+{
+}
+
+FileException::FileException(const std::string& fileName, const std::string& message, const std::string& function,
+                             const std::string& sourceFile, unsigned int nLine)
+    : Exception(message, function, sourceFile, nLine), moFileName(fileName)
+{
+}
+
+FileNotFoundException::FileNotFoundException(const std::string& fileName, const std::string& message,
+                                             const std::string& function, const std::string& sourceFile,
+                                             unsigned int nLine)
+    : FileException(fileName, message, function, sourceFile, nLine)
+{
+}
+
+FileFormatException::FileFormatException(const std::string& fileName, const std::string& message,
+                                         const std::string& function, const std::string& sourceFile, unsigned int nLine)
+    : FileException(fileName, message, function, sourceFile, nLine)
+{
+}
+
+IOException::IOException(const std::string& fileName, const std::string& message, const std::string& function,
+                         const std::string& sourceFile, unsigned int nLine)
+    : FileException(fileName, message, function, sourceFile, nLine)
+{
+}
+
+OSException::OSException(int nError, const std::string& message, const std::string& function,
+                         const std::string& sourceFile, unsigned int nLine)
+    : Exception(message, function, sourceFile, nLine), mnError(nError)
+{
+}
+
+LibraryException::LibraryException(const std::string& libraryFile, int nType, const std::string& message,
+                                   const std::string& function, const std::string& sourceFile, unsigned int nLine)
+    : Exception(message, function, sourceFile, nLine), moLibraryFile(libraryFile), mnType(nType)
+{
+}
+
+OutOfBoundsException::OutOfBoundsException(const std::vector<unsigned int>& oIndices, const std::string& message,
+                                           const std::string& function, const std::string& sourceFile,
+                                           unsigned int nLine)
+    : Exception(message, function, sourceFile, nLine), moIndices(oIndices)
 {
 }
 

@@ -10,11 +10,15 @@
 namespace krv
 {
 
-// Root of everything the toolkit throws. what() is the message; the place says where it was thrown.
+// Root of everything the toolkit throws. what() is the message; the place says where it was thrown. Each kind is made
+// either from a place, by default that of the throw, or from the full signature of a function, a source file and a
+// line, which are kept as they are: for a failure that somebody else reports, such as another process.
 class KRV_TOOLKIT_API Exception : public std::exception
 {
 public:
     explicit Exception(const std::string& message, const Place& oPlace = Place::Current());
+    Exception(const std::string& message, const std::string& function, const std::string& sourceFile,
+              unsigned int nLine);
     Exception(const Exception&);
     Exception& operator=(const Exception&);
     ~Exception() override;
@@ -37,6 +41,8 @@ class KRV_TOOLKIT_API DataException : public Exception
 {
 public:
     explicit DataException(const std::string& message, const Place& oPlace = Place::Current());
+    DataException(const std::string& message, const std::string& function, const std::string& sourceFile,
+                  unsigned int nLine);
     ~DataException() override;
 };
 
@@ -51,6 +57,8 @@ public:
 
     ParameterException(const std::string& message, int nType, const std::string& parameter,
                        const Place& oPlace = Place::Current());
+    ParameterException(const std::string& message, int nType, const std::string& parameter, const std::string& function,
+                       const std::string& sourceFile, unsigned int nLine);
     ~ParameterException() override;
 
     int GetType() const { return mnType; }
@@ -66,6 +74,8 @@ class KRV_TOOLKIT_API FileException : public Exception
 {
 public:
     FileException(const std::string& fileName, const std::string& message, const Place& oPlace = Place::Current());
+    FileException(const std::string& fileName, const std::string& message, const std::string& function,
+                  const std::string& sourceFile, unsigned int nLine);
     ~FileException() override;
 
     const std::string& GetFileName() const { return moFileName; }
@@ -80,6 +90,8 @@ class KRV_TOOLKIT_API FileNotFoundException : public FileException
 public:
     FileNotFoundException(const std::string& fileName, const std::string& message,
                           const Place& oPlace = Place::Current());
+    FileNotFoundException(const std::string& fileName, const std::string& message, const std::string& function,
+                          const std::string& sourceFile, unsigned int nLine);
     ~FileNotFoundException() override;
 };
 
@@ -89,6 +101,8 @@ class KRV_TOOLKIT_API FileFormatException : public FileException
 public:
     FileFormatException(const std::string& fileName, const std::string& message,
                         const Place& oPlace = Place::Current());
+    FileFormatException(const std::string& fileName, const std::string& message, const std::string& function,
+                        const std::string& sourceFile, unsigned int nLine);
     ~FileFormatException() override;
 };
 
@@ -97,6 +111,8 @@ class KRV_TOOLKIT_API IOException : public FileException
 {
 public:
     IOException(const std::string& fileName, const std::string& message, const Place& oPlace = Place::Current());
+    IOException(const std::string& fileName, const std::string& message, const std::string& function,
+                const std::string& sourceFile, unsigned int nLine);
     ~IOException() override;
 };
 
@@ -106,6 +122,8 @@ class KRV_TOOLKIT_API OSException : public Exception
 public:
     // nError: the system's error number (errno).
     OSException(int nError, const std::string& message, const Place& oPlace = Place::Current());
+    OSException(int nError, const std::string& message, const std::string& function, const std::string& sourceFile,
+                unsigned int nLine);
     ~OSException() override;
 
     int GetError() const { return mnError; }
@@ -127,6 +145,8 @@ public:
 
     LibraryException(const std::string& libraryFile, int nType, const std::string& message,
                      const Place& oPlace = Place::Current());
+    LibraryException(const std::string& libraryFile, int nType, const std::string& message, const std::string& function,
+                     const std::string& sourceFile, unsigned int nLine);
     ~LibraryException() override;
 
     const std::string& GetLibraryFile() const { return moLibraryFile; }
@@ -143,6 +163,8 @@ class KRV_TOOLKIT_API OutOfBoundsException : public Exception
 public:
     OutOfBoundsException(const std::vector<unsigned int>& oIndices, const std::string& message,
                          const Place& oPlace = Place::Current());
+    OutOfBoundsException(const std::vector<unsigned int>& oIndices, const std::string& message,
+                         const std::string& function, const std::string& sourceFile, unsigned int nLine);
     ~OutOfBoundsException() override;
 
     const std::vector<unsigned int>& GetIndices() const { return moIndices; }

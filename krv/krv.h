@@ -1,0 +1,100 @@
+#pragma once
+
+// The common names of the library in one namespace, for programs that read and write rasters:
+//     #include <krv/krv.h>
+//     const auto poReader = krv::OpenHaloReader("scene.tif", {1}, 8);
+//     for (const std::unique_ptr<krv::Raster> poTile : krv::RasterRange(*poReader)) ...
+// Each name is also what its own header calls it; both may be mixed. Pointers that callers own are std::unique_ptr here
+// (datasources/utils/open.h). Authors of formats include what they use of datasources/interfaces instead.
+
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "datasources/metadata/auxiliarydata.h"
+#include "datasources/metadata/typednodata.h"
+#include "datasources/overviews/overviewbuilder.h"
+#include "datasources/reader/basicreader.h"
+#include "datasources/reader/derived/transformrasterreader.h"
+#include "datasources/reader/exacthaloreader.h"
+#include "datasources/reader/ioverviewaccessor.h"
+#include "datasources/reader/rasterrange.h"
+#include "datasources/reader/readervalidity.h"
+#include "datasources/reader/tilework.h"
+#include "datasources/utils/open.h"
+#include "datasources/writer/basicwriter.h"
+#include "datasources/writer/copyallbutpixels.h"
+#include "datasources/writer/replacingwriter.h"
+#include "gobs/mask/mask.h"
+#include "gobs/pct/pct.h"
+#include "gobs/raster/raster.h"
+#include "gobs/raster/rasterview.h"
+#include "gobs/resampling/gridmap.h"
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/ogc/cs/coordinatetransformation.h"
+#include "toolkit/ogc/cs/crsfactory.h"
+#include "toolkit/ogc/cs/geocodinginfo.h"
+#include "toolkit/ogc/cs/mapwindow.h"
+#include "toolkit/threading/threadpool.h"
+
+namespace krv
+{
+
+// Files: eReadOnly, eUpdate.
+using ::AccessMode;
+using enum ::AccessMode;
+using datasources::DatasetManager;
+using datasources::IDataset;
+using datasources::IRasterDataset;
+
+// Rasters: eMirror and the other behaviours of margins, eDT_8U and the other types.
+using ::eMarginBehaviour;
+using enum ::eMarginBehaviour;
+using gobs::Complex;
+using gobs::DataType;
+using gobs::Mask;
+using gobs::NativeDataTypeCode;
+using gobs::PCT;
+using gobs::Raster;
+using gobs::RasterContext;
+using gobs::RasterInfo;
+using gobs::RasterView;
+using enum gobs::NativeDataTypeCode;
+
+// Readers.
+using datasources::BasicReader;
+using datasources::ExactHaloReader;
+using datasources::ForEachTile;
+using datasources::IRasterReader;
+using datasources::RasterRange;
+using datasources::ReaderValidity;
+using datasources::TileJob;
+using datasources::TransformRasterReader;
+using datasources::TransformRequest;
+using gobs::AffineMap;
+using gobs::Resampling;
+using threading::ThreadPool;
+
+// Writers.
+using datasources::BasicWriter;
+using datasources::BuildOverviews;
+using datasources::CopyAllButPixels;
+using datasources::GetDefaultLevels;
+using datasources::IRasterWriter;
+using datasources::ReplacingWriter;
+
+// What belongs to an image.
+using datasources::AuxiliaryData;
+using datasources::GetNoData;
+using datasources::NoDataValue;
+using datasources::SetFileNoData;
+using datasources::SetNoData;
+using ogc::cs::CoordinateTransformation;
+using ogc::cs::CreateCRSFromEPSG;
+using ogc::cs::CreateCRSFromWKT;
+using ogc::cs::GeocodingInfo;
+using ogc::cs::ICRS;
+using ogc::cs::MapBounds;
+using ogc::cs::PixelWindow;
+
+} // namespace krv
