@@ -14,6 +14,8 @@ KRV_PACKAGES_TEST=(libgtest-dev libgmock-dev)
 KRV_PACKAGES_BENCH=(libcairo2-dev libagg-dev libvips-dev libvips-tools libtiff-tools)
 KRV_PACKAGES_FUZZ=(clang-16 libclang-rt-16-dev)
 KRV_PACKAGES_CI=(clang-format-14 clang-tidy-16)
+# API pages.
+KRV_PACKAGES_DOC=(doxygen)
 
 say() { printf '\n== %s\n' "$*"; }
 fail() { printf 'error: %s\n' "$*" >&2; exit 1; }

@@ -22,7 +22,7 @@ expect()
 {
     local oText=$1 oOutput
     shift
-    oOutput=$("$@") || { echo "failed: $*" >&2; exit 1; }
+    oOutput=$("$@" 2>"$oWork/expect.log") || { cat "$oWork/expect.log" >&2; echo "failed: $*" >&2; exit 1; }
     [[ $oOutput == *"$oText"* ]] || { printf 'no "%s" in the output of %s:\n%s\n' "$oText" "$*" "$oOutput" >&2; exit 1; }
 }
 
@@ -79,14 +79,13 @@ expect "hill.tif is written" example newfile hill.tif
 for oText in "1000 x 1000" "no-data -9999" "500 x 500" "UTM zone 19S" "height in metres"; do
     expect "$oText" "$oHome/bin/krv" info hill.tif
 done
-expect " 785349 " "$oHome/bin/krv" stats hill.tif # the pixels within 500 of the middle
+expect " 785321 " "$oHome/bin/krv" stats hill.tif # the pixels within 500 of the middle
 refused "hill.tif: The dataset already exists" example newfile hill.tif
 quietly filtered example filterscene rgb.tif smooth.tif
 expect "600 x 600" "$oHome/bin/krv" info smooth.tif
 cp rgb.tif edited.tif
-expect "me
-edited channel, no-data 7.5" example editmetadata edited.tif 7.5
-expect "Sample scene" "$oHome/bin/krv" info edited.tif
+expect "edited channel, no-data 7.5, in WGS 84 / UTM zone 19S" example editmetadata edited.tif 7.5
+expect "OPERATOR" "$oHome/bin/krv" info edited.tif
 expect "grid.tif has 1000 x 1000 pixels" example togrid rgb.tif hill.tif grid.tif
 expect "500000" "$oHome/bin/krv" info grid.tif
 cp rgb.tif masked.tif

@@ -56,7 +56,7 @@ TEST_F(OpenTest, WhatIsHandedOutLivesAndWhatIsMissingIsNamed)
     const std::string file = MakeScene("scene.tif");
     const auto poReader = OpenReader(file);
     EXPECT_EQ(GetLevels(*poReader), (std::vector<unsigned int>{2, 4}));
-    EXPECT_EQ(Read(*OpenLevel(*poReader, 4), PixelWindow{3, 0, 1, 1})->GetBuffer()[0], 12);
+    EXPECT_EQ(Read(*OpenLevel(*poReader, 4), PixelWindow{3, 0, 1, 1})->GetBuffer()[0], 14);
     EXPECT_NE(Error([&] { OpenLevel(*poReader, 3); }), "");
 
     // What the rectangle touches, and nothing that it only borders on.
