@@ -40,7 +40,7 @@ public:
                      unsigned char* const pBuffer) final;
 
 private:
-    // Of one pixel with all its channels.
+    // The bytes of one pixel with all its channels.
     virtual std::size_t GetPixelBytes() const = 0;
     // A rectangle with pixels, inside the image; its row r lies at the pointer + r * nPitch bytes.
     virtual void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) = 0;

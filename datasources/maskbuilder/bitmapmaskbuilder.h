@@ -28,7 +28,8 @@ public:
     // not supported" for a format without bitmaps. Whatever throws after the file was opened leaves the dataset
     // undeleted, intended.
     BitmapMaskBuilder(const std::string& fileName, unsigned int nBitmap);
-    // Of an open dataset. With bOwnsDataset the builder deletes it; it stays the caller's when the constructor throws.
+    // The bitmaps of an open dataset. With bOwnsDataset the builder deletes it; it stays the caller's when the
+    // constructor throws.
     BitmapMaskBuilder(IBitmapDataset* poDataset, unsigned int nBitmap, bool bOwnsDataset);
     BitmapMaskBuilder(const BitmapMaskBuilder&);
     BitmapMaskBuilder& operator=(const BitmapMaskBuilder&);

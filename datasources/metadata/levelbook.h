@@ -19,7 +19,7 @@ KRV_DATASOURCES_API bool IsLevelValid(const AuxiliaryData& oBook, unsigned int n
 // method: in capitals; empty when it is not known.
 KRV_DATASOURCES_API void SetLevelValid(AuxiliaryData& oBook, unsigned int nChannel, unsigned int nLevel, bool bValid,
                                        const std::string& method);
-// Of no channel, by no method. Returns whether that is news.
+// Marks the level as valid for no channel, and by no method. Returns whether that is news.
 KRV_DATASOURCES_API bool SetLevelInvalid(AuxiliaryData& oBook, unsigned int nLevel);
 KRV_DATASOURCES_API void RemoveLevel(AuxiliaryData& oBook, unsigned int nLevel);
 // Puts what a book says of a level in the place of what another one does, for the channels that both have.

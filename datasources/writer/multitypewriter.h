@@ -73,7 +73,7 @@ public:
     // channels get the types that were given, each its own.
     using BasicWriter::CreateNewFile;
 
-    // Of each channel, in the order of the rasters, the number of samples so far that are not what the raster had.
+    // The number of samples so far that are not what the raster had, of each channel in the order of the rasters.
     const std::vector<std::uint64_t>& GetChangedSamples() const;
 
     // Levels in the type of the rasters, as MultiTypeReader and this class have them. Their writers are not strict:

@@ -33,7 +33,7 @@ SplitWriter::SplitWriter(IRasterWriter& oWriter, unsigned int nLevel, unsigned i
     IDataset* const poDataset = poAccess != nullptr ? poAccess->GetDataset() : nullptr;
     auto* const poEncoding = dynamic_cast<IBlockEncoding*>(poDataset);
     auto* const poBlocks = dynamic_cast<IEncodedBlocks*>(poDataset);
-    // Of bitmaps there are no levels, and their blocks are not those of the image.
+    // Bitmaps have no levels, and their blocks are not those of the image.
     const bool bImage =
         nLevel != 1 || std::unique_ptr<IOverviewWriterAccessor>(oWriter.GetOverviewWriterAccessor()) != nullptr;
     if (poEncoding == nullptr || poBlocks == nullptr || !bImage)

@@ -269,7 +269,7 @@ private:
             mnFirst = std::clamp(oRange.mnFirst, nBegin, nEnd);
             for (long long n = mnFirst; n < std::clamp(oRange.mnEnd, nBegin, nEnd); ++n)
                 moWeights.push_back(At(static_cast<double>(n)));
-            // Of very many weights the sum is taken from samples of them.
+            // The sum of very many weights is taken from samples of them.
             const long long nTaps = oRange.mnEnd - oRange.mnFirst;
             const double nStep = std::max(1.0, static_cast<double>(nTaps) / MOST_TAPS);
             for (double n = 0; n < static_cast<double>(nTaps); n += nStep)
@@ -285,30 +285,30 @@ private:
 
     struct Sum
     {
-        Real maSums[P] = {};
+        Real moSums[P] = {};
         Real mnWeight = 0;
-        T maLowest[P];
-        T maHighest[P];
+        T moLowest[P];
+        T moHighest[P];
 
         Sum()
         {
-            std::fill_n(maLowest, P, std::numeric_limits<T>::max());
-            std::fill_n(maHighest, P, std::numeric_limits<T>::lowest());
+            std::fill_n(moLowest, P, std::numeric_limits<T>::max());
+            std::fill_n(moHighest, P, std::numeric_limits<T>::lowest());
         }
         void Add(const T* pValue, Real nWeight)
         {
             mnWeight += nWeight;
             for (unsigned int n = 0; n < P; ++n)
             {
-                maSums[n] += nWeight * static_cast<Real>(pValue[n]);
-                maLowest[n] = std::min(maLowest[n], pValue[n]);
-                maHighest[n] = std::max(maHighest[n], pValue[n]);
+                moSums[n] += nWeight * static_cast<Real>(pValue[n]);
+                moLowest[n] = std::min(moLowest[n], pValue[n]);
+                moHighest[n] = std::max(moHighest[n], pValue[n]);
             }
         }
         T Get(unsigned int n, bool bClamp) const
         {
-            const T nValue = krv::raster::ConvertValue<T>(maSums[n] / mnWeight);
-            return bClamp && nValue == nValue ? std::max(std::min(nValue, maHighest[n]), maLowest[n]) : nValue;
+            const T nValue = krv::raster::ConvertValue<T>(moSums[n] / mnWeight);
+            return bClamp && nValue == nValue ? std::max(std::min(nValue, moHighest[n]), moLowest[n]) : nValue;
         }
     };
 
@@ -422,7 +422,7 @@ private:
         }
     }
 
-    // Of complex values the pair counts, in the order of real and imaginary parts.
+    // Complex values count as a pair, in the order of real and imaginary parts.
     static void MostFrequent(const std::vector<const T*>& oValues, T* pValue)
     {
         if constexpr (P == 1)

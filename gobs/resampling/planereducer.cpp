@@ -264,9 +264,8 @@ private:
 
 } // namespace
 
-class PlaneReducer::Sums
+struct PlaneReducer::Sums
 {
-public:
     Region region;
     std::vector<ChannelSums> channels;
     unsigned int right; // of the tile in the image, and its bottom

@@ -29,7 +29,7 @@ class KRV_GOBS_API PlaneReducer
 {
 public:
     // What the pixels of a tile add to the planes.
-    class Sums;
+    struct Sums;
 
     // The size of the planes is not more than that of the image. oNumbers: one per channel. eMethod: eAverage is the
     // mean of the valid source pixels that fall into a pixel, eNearest the one at their centre; ParameterException for
@@ -38,7 +38,7 @@ public:
                  unsigned int nHeight, const NoDataNumbers& oNumbers, Resampling eMethod);
     ~PlaneReducer();
 
-    // Of a tile of the image without margins. Any thread.
+    // The sums of a tile of the image without margins. Any thread.
     std::shared_ptr<const Sums> Sum(const Raster& oTile) const;
     // The tiles of the image, each once, row by row from the left.
     void Add(const Sums& oSums);

@@ -34,7 +34,7 @@ protected:
 private:
     void ReadHeader();
     std::string MakeHeader(const support::RecordText& oRecord) const;
-    // Of the image, level 1, or a level.
+    // Those of the image, level 1, or of a level.
     support::ImageLayout MakeLayout(unsigned int nLevel) const;
 
     std::shared_ptr<support::HeadedFile> mpoFile;

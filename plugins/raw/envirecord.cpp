@@ -162,7 +162,7 @@ void WriteNames(std::vector<std::string>& oNames, HeaderText& oHeader)
 struct MapInfo
 {
     std::string moProjection;
-    std::array<double, 6> maNumbers{}; // reference pixel, its place on the map, steps
+    std::array<double, 6> moNumbers{}; // reference pixel, its place on the map, steps
     std::vector<std::string> moRest;   // zone and hemisphere, datum, units=, rotation=
 };
 
@@ -170,17 +170,17 @@ std::optional<MapInfo> ReadMapInfo(const HeaderText& oHeader)
 {
     const auto oParts = oHeader.GetList(MAP_INFO);
     MapInfo oInfo;
-    if (oParts.size() < 1 + oInfo.maNumbers.size())
+    if (oParts.size() < 1 + oInfo.moNumbers.size())
         return std::nullopt;
     oInfo.moProjection = oParts.front();
-    for (std::size_t n = 0; n < oInfo.maNumbers.size(); ++n)
+    for (std::size_t n = 0; n < oInfo.moNumbers.size(); ++n)
     {
         const auto oNumber = ParseReal(oParts[n + 1]);
         if (!oNumber)
             return std::nullopt;
-        oInfo.maNumbers[n] = *oNumber;
+        oInfo.moNumbers[n] = *oNumber;
     }
-    oInfo.moRest.assign(oParts.begin() + 1 + oInfo.maNumbers.size(), oParts.end());
+    oInfo.moRest.assign(oParts.begin() + 1 + oInfo.moNumbers.size(), oParts.end());
     return oInfo;
 }
 
@@ -300,7 +300,7 @@ bool IsSameByNumbers(const ICRS& oFirst, const ICRS& oSecond)
 void SetMapInfo(const MapInfo& oInfo, HeaderText& oHeader)
 {
     std::vector<std::string> oParts{oInfo.moProjection};
-    for (const double nNumber : oInfo.maNumbers)
+    for (const double nNumber : oInfo.moNumbers)
         oParts.push_back(krv::NumberText(nNumber));
     oParts.insert(oParts.end(), oInfo.moRest.begin(), oInfo.moRest.end());
     oHeader.SetList(MAP_INFO, oParts);
@@ -414,7 +414,7 @@ std::optional<GeocodingInfo> ReadGeocoding(const HeaderText& oHeader)
     const auto oInfo = ReadMapInfo(oHeader);
     if (!oInfo || IsRotated(*oInfo))
         return std::nullopt;
-    const auto& [nColumn, nRow, nX, nY, nStepX, nStepY] = oInfo->maNumbers;
+    const auto& [nColumn, nRow, nX, nY, nStepX, nStepY] = oInfo->moNumbers;
     // Reference pixel 1, 1 is the outer corner of the first one.
     const GeocodingInfo oGeocoding(nX - (nColumn - 1) * nStepX, nStepX, 0, nY + (nRow - 1) * nStepY, 0, -nStepY);
     return oGeocoding.IsInvertible() ? std::optional(oGeocoding) : std::nullopt;
@@ -428,7 +428,7 @@ bool WriteGeocoding(const GeocodingInfo& oGeocoding, const ICRS* poCRS, HeaderTe
         return true;
     MapInfo oInfo;
     std::tie(oInfo.moProjection, oInfo.moRest) = DescribeSystem(poCRS);
-    oInfo.maNumbers = {
+    oInfo.moNumbers = {
         1, 1, oGeocoding.GetXOffset(), oGeocoding.GetYOffset(), oGeocoding.GetXPerColumn(), -oGeocoding.GetYPerRow()};
     SetMapInfo(oInfo, oHeader);
     return true;

@@ -16,7 +16,7 @@ class LevelStore : public krv::datasources::LevelStore
 public:
     ~LevelStore() override;
 
-    // Of those that there are.
+    // The pixels of a level that there is.
     virtual std::shared_ptr<BlockImage> OpenLevel(unsigned int nLevel) = 0;
 };
 

@@ -22,7 +22,7 @@ struct KRV_TOOLKIT_API FileStamp
 
     friend bool operator==(const FileStamp&, const FileStamp&) = default;
 
-    // Of an open file; nothing when the system does not tell.
+    // The stamp of an open file; nothing when the system does not tell.
     static std::optional<FileStamp> Read(int nDescriptor);
     // Notes that this process writes to the file, or just has: to be called before and after, by any thread.
     static void NoteChange(std::uint64_t nDevice, std::uint64_t nInode);

@@ -49,9 +49,9 @@ struct KRV_TOOLKIT_API RpcCoefficients
     std::string GetText() const;
     static std::optional<RpcCoefficients> FromText(std::string_view text);
 
-    // Of an image whose outer corner lies at that place of this one.
+    // The coefficients of an image whose outer corner lies at that place of this one.
     RpcCoefficients Shifted(double nColumn, double nRow) const;
-    // Of a reduced image of the same scene; the ratios are full size over reduced size.
+    // Those of a reduced image of the same scene; the ratios are full size over reduced size.
     RpcCoefficients Scaled(double nColumnRatio, double nRowRatio) const;
 
     // Why these numbers are no model; empty when they are one.

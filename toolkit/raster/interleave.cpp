@@ -20,7 +20,7 @@ constexpr std::size_t PIECE_BYTES = 8192; // of the destination, a quarter of th
 
 struct Sixteen
 {
-    std::uint64_t maParts[2];
+    std::uint64_t moParts[2];
 };
 
 // Calls oWork with a value of the unsigned type that has so many bytes.
@@ -137,7 +137,7 @@ using Unsigned =
 template <typename T>
 struct Quads
 {
-    Vector maVectors[4];
+    Vector moVectors[4];
 
     explicit Quads(const unsigned char* const* planes, std::size_t nOffset)
     {
@@ -146,10 +146,10 @@ struct Quads
         const Vector c = LoadVector(planes[2] + nOffset), d = LoadVector(planes[3] + nOffset);
         const Vector oLowAb = MixLow<T>(a, b), oHighAb = MixHigh<T>(a, b);
         const Vector oLowCd = MixLow<T>(c, d), oHighCd = MixHigh<T>(c, d);
-        maVectors[0] = MixLow<Pair>(oLowAb, oLowCd);
-        maVectors[1] = MixHigh<Pair>(oLowAb, oLowCd);
-        maVectors[2] = MixLow<Pair>(oHighAb, oHighCd);
-        maVectors[3] = MixHigh<Pair>(oHighAb, oHighCd);
+        moVectors[0] = MixLow<Pair>(oLowAb, oLowCd);
+        moVectors[1] = MixHigh<Pair>(oLowAb, oLowCd);
+        moVectors[2] = MixLow<Pair>(oHighAb, oHighCd);
+        moVectors[3] = MixHigh<Pair>(oHighAb, oHighCd);
     }
 };
 
@@ -190,7 +190,7 @@ void MixFour(const unsigned char* const* planes, std::size_t nOffset, unsigned c
 {
     const Quads<T> oQuads(planes, nOffset);
     for (std::size_t i = 0; i < 4; ++i)
-        StoreVector(destination + i * 16, oQuads.maVectors[i]);
+        StoreVector(destination + i * 16, oQuads.moVectors[i]);
 }
 
 template <typename T>
@@ -200,8 +200,8 @@ void MixEight(const unsigned char* const* planes, std::size_t nOffset, unsigned 
     const Quads<T> oFirst(planes, nOffset), oSecond(planes + 4, nOffset);
     for (std::size_t i = 0; i < 4; ++i)
     {
-        StoreVector(destination + i * 32, MixLow<Quad>(oFirst.maVectors[i], oSecond.maVectors[i]));
-        StoreVector(destination + i * 32 + 16, MixHigh<Quad>(oFirst.maVectors[i], oSecond.maVectors[i]));
+        StoreVector(destination + i * 32, MixLow<Quad>(oFirst.moVectors[i], oSecond.moVectors[i]));
+        StoreVector(destination + i * 32 + 16, MixHigh<Quad>(oFirst.moVectors[i], oSecond.moVectors[i]));
     }
 }
 
@@ -213,7 +213,7 @@ void MixFourApart(const unsigned char* const* planes, std::size_t nOffset, unsig
     const Quads<T> oQuads(planes, nOffset);
     alignas(16) unsigned char aQuads[64];
     for (std::size_t i = 0; i < 4; ++i)
-        StoreVector(aQuads + i * 16, oQuads.maVectors[i]);
+        StoreVector(aQuads + i * 16, oQuads.moVectors[i]);
     for (std::size_t i = 0; i < 16 / sizeof(T); ++i)
         std::memcpy(destination + i * nPixelBytes, aQuads + i * 4 * sizeof(T), 4 * sizeof(T));
 }

@@ -159,7 +159,7 @@ void Splitter::Part::CountEach(const unsigned char* pGathered, const unsigned ch
             pChanged[nChannel] += mpCount(pGathered + nFirst * nFrom, pTarget + nFirst * nTo, nPixels, mnParts);
             continue;
         }
-        // Of a complex value either part may have changed.
+        // Either part of a complex value may have changed.
         for (std::size_t nPixel = 0; nPixel < nPixels; ++nPixel)
         {
             const std::size_t nAt = nPixel * mnParts + nFirst;

@@ -368,7 +368,7 @@ private:
         return oWindow;
     }
 
-    // Of an affine map the corners bound everything.
+    // The corners of an affine map bound everything.
     std::size_t NextRow(std::size_t nAt, std::size_t nCount) const
     {
         return mpoAffine != nullptr && nAt + 1 < nCount ? nCount - 1 - nAt : 1;

@@ -23,17 +23,17 @@ struct PartList
         for (std::size_t n = 0; n < 256; ++n)
             aBytes[n] = reinterpret_cast<const std::uint8_t*>(pList + n)[nPart];
         for (std::size_t n = 0; n < 4; ++n)
-            maQuarters[n] = _mm512_load_si512(aBytes + 64 * n);
+            moQuarters[n] = _mm512_load_si512(aBytes + 64 * n);
     }
 
     __m512i Find(__m512i oValues) const
     {
-        const __m512i oLow = _mm512_permutex2var_epi8(maQuarters[0], oValues, maQuarters[1]);
-        const __m512i oHigh = _mm512_permutex2var_epi8(maQuarters[2], oValues, maQuarters[3]);
+        const __m512i oLow = _mm512_permutex2var_epi8(moQuarters[0], oValues, moQuarters[1]);
+        const __m512i oHigh = _mm512_permutex2var_epi8(moQuarters[2], oValues, moQuarters[3]);
         return _mm512_mask_blend_epi8(_mm512_movepi8_mask(oValues), oLow, oHigh);
     }
 
-    __m512i maQuarters[4];
+    __m512i moQuarters[4];
 };
 
 // Where the bytes of a vector of interleaved parts come from, two parts at a time: of the first and the second, and

@@ -61,7 +61,7 @@ inline std::uint8_t ModeOfSixteen(const std::uint8_t* pValues)
     return static_cast<std::uint8_t>(255 - nBest % 256);
 }
 
-// Of bytes, by how often each occurs: fewer than 256 or 65536 of them, as Count says.
+// The mode of bytes, by how often each occurs: fewer than 256 or 65536 of them, as Count says.
 template <typename Count>
 inline std::uint8_t ModeByCounts(const std::uint8_t* pValues, std::size_t nValues)
 {

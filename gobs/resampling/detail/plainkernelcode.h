@@ -126,13 +126,13 @@ struct Places
         for (std::size_t n = 0; n < nCount; ++n)
         {
             const double nPlace = p[n] - nFirst;
-            maPixels[n] = static_cast<std::int32_t>(nPlace);
-            maFractions[n] = nPlace - maPixels[n];
+            moPixels[n] = static_cast<std::int32_t>(nPlace);
+            moFractions[n] = nPlace - moPixels[n];
         }
     }
 
-    std::int32_t maPixels[BLOCK];
-    double maFractions[BLOCK];
+    std::int32_t moPixels[BLOCK];
+    double moFractions[BLOCK];
 };
 
 struct CubicWeights
@@ -142,14 +142,14 @@ struct CubicWeights
         for (std::size_t n = 0; n < nCount; ++n)
         {
             const double f = pFractions[n];
-            maWeights[n][0] = static_cast<float>(((-0.5 * f + 1) * f - 0.5) * f);
-            maWeights[n][1] = static_cast<float>((1.5 * f - 2.5) * f * f + 1);
-            maWeights[n][2] = static_cast<float>(((-1.5 * f + 2) * f + 0.5) * f);
-            maWeights[n][3] = static_cast<float>((0.5 * f - 0.5) * f * f);
+            moWeights[n][0] = static_cast<float>(((-0.5 * f + 1) * f - 0.5) * f);
+            moWeights[n][1] = static_cast<float>((1.5 * f - 2.5) * f * f + 1);
+            moWeights[n][2] = static_cast<float>(((-1.5 * f + 2) * f + 0.5) * f);
+            moWeights[n][3] = static_cast<float>((0.5 * f - 0.5) * f * f);
         }
     }
 
-    alignas(16) float maWeights[BLOCK][4];
+    alignas(16) float moWeights[BLOCK][4];
 };
 
 template <typename T, std::size_t N>
@@ -164,10 +164,10 @@ struct Bilinear
         T* const pResult = reinterpret_cast<T*>(oJob.mpResult) + nFrom * N;
         for (std::size_t n = 0; n < nCount; ++n)
         {
-            const T* const p = pPixels + static_cast<std::size_t>(oY.maPixels[n]) * oJob.mnRowSamples +
-                               static_cast<std::size_t>(oX.maPixels[n]) * N;
+            const T* const p = pPixels + static_cast<std::size_t>(oY.moPixels[n]) * oJob.mnRowSamples +
+                               static_cast<std::size_t>(oX.moPixels[n]) * N;
             const T* const q = p + oJob.mnRowSamples;
-            const auto fx = static_cast<float>(oX.maFractions[n]), fy = static_cast<float>(oY.maFractions[n]);
+            const auto fx = static_cast<float>(oX.moFractions[n]), fy = static_cast<float>(oY.moFractions[n]);
             if constexpr (N == 1)
             {
                 const auto nAbove =
@@ -196,15 +196,15 @@ struct Cubic
         CubicWeights oXWeights, oYWeights;
         oX.Find(oJob.mpX + nFrom, oJob.mnLeft, nCount);
         oY.Find(oJob.mpY + nFrom, oJob.mnTop, nCount);
-        oXWeights.Find(oX.maFractions, nCount);
-        oYWeights.Find(oY.maFractions, nCount);
+        oXWeights.Find(oX.moFractions, nCount);
+        oYWeights.Find(oY.moFractions, nCount);
         const T* const pPixels = reinterpret_cast<const T*>(oJob.mpPixels);
         T* const pResult = reinterpret_cast<T*>(oJob.mpResult) + nFrom * N;
         for (std::size_t n = 0; n < nCount; ++n)
         {
-            const T* const p = pPixels + static_cast<std::size_t>(oY.maPixels[n] - 1) * oJob.mnRowSamples +
-                               static_cast<std::size_t>(oX.maPixels[n] - 1) * N;
-            const float *const pXWeights = oXWeights.maWeights[n], *const pYWeights = oYWeights.maWeights[n];
+            const T* const p = pPixels + static_cast<std::size_t>(oY.moPixels[n] - 1) * oJob.mnRowSamples +
+                               static_cast<std::size_t>(oX.moPixels[n] - 1) * N;
+            const float *const pXWeights = oXWeights.moWeights[n], *const pYWeights = oYWeights.moWeights[n];
             if (pXWeights[2] == 0 || pYWeights[2] == 0)
                 StorePixel<T, N>(pResult + n * N, AddOnGrid(p, oJob.mnRowSamples, pXWeights, pYWeights, oJob.mbClamp),
                                  true);

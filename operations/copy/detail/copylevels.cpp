@@ -140,7 +140,7 @@ private:
     std::vector<LevelReader> moPlanes; // that are decoded, too; none when nothing is
 };
 
-// Of one bitmap at a level, pixel for pixel.
+// One bitmap at a level is copied pixel for pixel.
 void CopyMaskLevel(IRasterIO& oFrom, IRasterIO& oTo)
 {
     const unsigned int nWidth = oFrom.GetFileWidth(), nHeight = oFrom.GetFileHeight();

@@ -24,7 +24,7 @@ std::string NameModel(const CopyPlan& oPlan, unsigned int nModel)
     return fmt::format("{}: sensor model {}", oPlan.GetSource(0).GetName(), nModel);
 }
 
-// Of the part that is copied.
+// The model of the part that is copied.
 std::unique_ptr<IMathModel> LoadModel(const CopyPlan& oPlan, IMathModelDataset& oModels, unsigned int nModel)
 {
     std::unique_ptr<IMathModel> poModel(oModels.GetMathModel(nModel));
@@ -37,7 +37,7 @@ std::unique_ptr<IMathModel> LoadModel(const CopyPlan& oPlan, IMathModelDataset& 
         poPolynomials->GetCoefficients().Shifted(oPlan.GetWindow().x, oPlan.GetWindow().y));
 }
 
-// Of a file that has its model in the record alone.
+// The file has its model in the record alone.
 void CreateFromRecord(const CopyPlan& oPlan, const Target& oTarget, IMathModelDataset& oTo)
 {
     const auto oModel = RpcCoefficients::FromText(oPlan.GetSource(0).GetMetadata().GetFileMetadataValue(POLYNOMIALS));

@@ -31,7 +31,7 @@ namespace
 {
 
 constexpr std::uint64_t LARGEST_PIECE = std::uint64_t{64} << 20;
-// Of pieces that wait to be stored.
+// The bytes of pieces that wait to be stored.
 constexpr std::uint64_t MOST_WAITING_BYTES = std::uint64_t{256} << 20;
 
 struct PieceSize

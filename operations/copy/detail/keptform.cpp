@@ -19,7 +19,7 @@ namespace
 
 // Larger blocks are handled in pieces; a copy is better off with the format's own.
 constexpr std::uint64_t LARGEST_KEPT_BLOCK = std::uint64_t{64} << 20;
-// Of a block that moves as a whole, decoded.
+// The bytes of a block that moves as a whole, decoded.
 constexpr std::uint64_t LARGEST_MOVED_BLOCK = std::uint64_t{256} << 20;
 constexpr const char* FORM_KEYS[] = {"COMPRESS",   "LEVEL",      "PREDICTOR",  "TILED",
                                      "BLOCKXSIZE", "BLOCKYSIZE", "INTERLEAVE", "NBITS"};

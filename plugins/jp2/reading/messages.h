@@ -20,8 +20,8 @@ public:
         opj_set_info_handler(pCodec, &Ignore, nullptr);
     }
 
-    bool HasError() const { return maError[0] != '\0'; }
-    std::string Get() const { return HasError() ? maError : "OpenJPEG does not say why"; }
+    bool HasError() const { return moError[0] != '\0'; }
+    std::string Get() const { return HasError() ? moError : "OpenJPEG does not say why"; }
 
 private:
     static void OnError(const char* pText, void* pThis)
@@ -29,13 +29,13 @@ private:
         auto& oThis = *static_cast<Messages*>(pThis);
         if (oThis.HasError() || pText == nullptr)
             return;
-        std::strncpy(oThis.maError, pText, sizeof(oThis.maError) - 1);
-        oThis.maError[std::strcspn(oThis.maError, "\n")] = '\0';
+        std::strncpy(oThis.moError, pText, sizeof(oThis.moError) - 1);
+        oThis.moError[std::strcspn(oThis.moError, "\n")] = '\0';
     }
 
     static void Ignore(const char*, void*) {}
 
-    char maError[256] = {};
+    char moError[256] = {};
 };
 
 } // namespace krv::plugins::jp2

@@ -314,13 +314,13 @@ void LzwRun<bOld>::RunWidth()
 
 struct LzwDecoder::Table
 {
-    Entry maEntries[TABLE_SIZE];
+    Entry moEntries[TABLE_SIZE];
 
     Table()
     {
         for (Entry i = 0; i < CLEAR; ++i)
-            maEntries[i] = i + ONE_BYTE;
-        maEntries[CLEAR] = maEntries[END] = Entry{NO_STRING} << 56;
+            moEntries[i] = i + ONE_BYTE;
+        moEntries[CLEAR] = moEntries[END] = Entry{NO_STRING} << 56;
     }
 };
 
@@ -337,8 +337,8 @@ Result LzwDecoder::Decode(const unsigned char* input, std::size_t nInput, unsign
     if (!mpoTable)
         mpoTable = std::make_unique<Table>();
     if (IsOldStyle(input, nInput))
-        return LzwRun<true>(mpoTable->maEntries, input, nInput, output, nOutput).Decode();
-    return LzwRun<false>(mpoTable->maEntries, input, nInput, output, nOutput).Decode();
+        return LzwRun<true>(mpoTable->moEntries, input, nInput, output, nOutput).Decode();
+    return LzwRun<false>(mpoTable->moEntries, input, nInput, output, nOutput).Decode();
 }
 
 } // namespace krv::plugins::codec

@@ -57,22 +57,22 @@ struct LzwEncoder::Table
 {
     static constexpr std::size_t SIZE = 16384;
 
-    std::array<std::uint32_t, SIZE> maEntries;
+    std::array<std::uint32_t, SIZE> moEntries;
 
-    void Clear() { std::memset(maEntries.data(), 0, sizeof(maEntries)); }
+    void Clear() { std::memset(moEntries.data(), 0, sizeof(moEntries)); }
 
     // The code of a string; 0 when it is new, and then it gets nNewCode.
     std::uint32_t FindOrAdd(std::uint32_t nPrefix, unsigned char nByte, std::uint32_t nNewCode)
     {
         const std::uint32_t nKey = nPrefix << 8 | nByte;
         std::size_t nAt = (nKey * 0x9E3779B1u) >> 18;
-        while (maEntries[nAt] != 0)
+        while (moEntries[nAt] != 0)
         {
-            if (maEntries[nAt] >> 12 == nKey)
-                return maEntries[nAt] & 0xFFF;
+            if (moEntries[nAt] >> 12 == nKey)
+                return moEntries[nAt] & 0xFFF;
             nAt = (nAt + 1) % SIZE;
         }
-        maEntries[nAt] = nKey << 12 | nNewCode;
+        moEntries[nAt] = nKey << 12 | nNewCode;
         return 0;
     }
 };

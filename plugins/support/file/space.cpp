@@ -101,7 +101,7 @@ Extent Space::Take(std::uint64_t nBytes, std::uint64_t nReserve, const Place& oP
     return {nOffset, nTaken, mnGeneration};
 }
 
-// Of those that fit the smallest, as ever.
+// The smallest of those that fit is taken, as ever.
 std::optional<Extent> Space::AllocateBefore(std::uint64_t nBytes, std::uint64_t nEnd)
 {
     const std::uint64_t nTaken = nBytes + nBytes % 2;

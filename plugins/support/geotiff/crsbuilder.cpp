@@ -204,8 +204,8 @@ private:
         throw krv::DataException(moDefinition->cause, moPlace);
     }
 
-    // Of the map: the key against the definition. Feet of different countries count as one here, the definition knows
-    // better.
+    // The unit of the map is the key against the definition. Feet of different countries count as one here, the
+    // definition knows better.
     std::string CompareUnits() const
     {
         constexpr double ROUNDING = 1e-5;

@@ -15,7 +15,7 @@ namespace
 {
 
 constexpr std::uint16_t VERSION = 1;
-// Of a key: itself, the tag of its values or 0, their number, their place or the value.
+// The numbers of a key: itself, the tag of its values or 0, their number, their place or the value.
 constexpr std::size_t ENTRY_VALUES = 4;
 // Texts are stored one behind the other, each with this at its end.
 constexpr char TEXT_END = '|';

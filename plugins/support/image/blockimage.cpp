@@ -152,13 +152,13 @@ void BlockImage::DropBlocks()
 
 void BlockImage::NoteWindow(const Range& oRange, unsigned int nPlane)
 {
-    const bool bShared = nPlane == mnLastPlane && oRange.mnLeft <= maLastRange[2] && oRange.mnRight >= maLastRange[0] &&
-                         oRange.mnTop <= maLastRange[3] && oRange.mnBottom >= maLastRange[1];
+    const bool bShared = nPlane == mnLastPlane && oRange.mnLeft <= moLastRange[2] && oRange.mnRight >= moLastRange[0] &&
+                         oRange.mnTop <= moLastRange[3] && oRange.mnBottom >= moLastRange[1];
     mnSharing = std::clamp(mnSharing + (bShared ? 2 : -1), 0, SHARING_LIMIT);
-    maLastRange[0] = oRange.mnLeft;
-    maLastRange[1] = oRange.mnTop;
-    maLastRange[2] = oRange.mnRight;
-    maLastRange[3] = oRange.mnBottom;
+    moLastRange[0] = oRange.mnLeft;
+    moLastRange[1] = oRange.mnTop;
+    moLastRange[2] = oRange.mnRight;
+    moLastRange[3] = oRange.mnBottom;
     mnLastPlane = nPlane;
 }
 
@@ -211,7 +211,7 @@ void BlockImage::ReserveRowCache(const Job& oJob)
         mpoRowCache->Reserve(nBlocks * nPlanes * nBlockBytes);
 }
 
-// Of few rows of a block nothing is kept: they are read again at their own cost.
+// Few rows of a block are not kept: they are read again at their own cost.
 bool BlockImage::IsThin(unsigned int nRows) const
 {
     return nRows <= moLayout.GetBlockHeight() / 4;

@@ -140,7 +140,7 @@ private:
     std::vector<Scratch> moPlaneScratch;
 
     // The blocks of the last window and how often windows shared blocks with the one before.
-    unsigned int maLastRange[4] = {1, 1, 0, 0};
+    unsigned int moLastRange[4] = {1, 1, 0, 0};
     unsigned int mnLastPlane = 0;
     int mnSharing = 0;
 };

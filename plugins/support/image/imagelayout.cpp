@@ -31,7 +31,7 @@ ImageLayout::ImageLayout(unsigned int nWidth, unsigned int nHeight, unsigned int
     CheckSize(nBlockHeight, "block height", oPlace);
     mnBlocksAcross = (nWidth - 1) / nBlockWidth + 1;
     moFirstChannels.reserve(moPlanes.size() + 1);
-    maPixelBytes.reserve(moPlanes.size());
+    moPixelBytes.reserve(moPlanes.size());
     std::uint64_t nChannels = 0;
     for (Plane& oPlane : moPlanes)
     {
@@ -41,7 +41,7 @@ ImageLayout::ImageLayout(unsigned int nWidth, unsigned int nHeight, unsigned int
         if (oPlane.moNativeType == krv::gobs::DataType())
             oPlane.moNativeType = oPlane.moType;
         moFirstChannels.push_back(static_cast<unsigned int>(nChannels));
-        maPixelBytes.push_back(GetValueBytes(oPlane.moType) * oPlane.mnChannels);
+        moPixelBytes.push_back(GetValueBytes(oPlane.moType) * oPlane.mnChannels);
         nChannels += oPlane.mnChannels;
         CheckSize(oPlane.mnChannels, "channel count", oPlace);
     }

@@ -65,7 +65,7 @@ public:
 
     // Bytes of one value, and of all values of one pixel of a plane, as handed out.
     static std::size_t GetValueBytes(const krv::gobs::DataType& oType) { return oType.GetValueBits() / 8; }
-    std::size_t GetPixelBytes(unsigned int nPlane) const { return maPixelBytes[nPlane]; }
+    std::size_t GetPixelBytes(unsigned int nPlane) const { return moPixelBytes[nPlane]; }
 
     // The part of a block that lies in the image, in image coordinates.
     PixelRect GetBlockRect(unsigned int nColumn, unsigned int nRow) const;
@@ -84,7 +84,7 @@ private:
     unsigned int mnBlocksAcross;
     std::vector<Plane> moPlanes;
     std::vector<unsigned int> moFirstChannels; // of each plane, and the count of all at the end
-    std::vector<std::size_t> maPixelBytes;
+    std::vector<std::size_t> moPixelBytes;
 };
 
 } // namespace krv::plugins::support

@@ -42,7 +42,7 @@ public:
                 std::function<void()> oBeforeWrite = {});
     ~PlainSource() override;
 
-    // Of all pixels without gaps. Throws DataException above 2^62.
+    // The bytes of all pixels without gaps. Throws DataException above 2^62.
     static std::uint64_t CountBytes(const ImageLayout& oLayout);
     // Planes without gaps; what no file can hold lies behind the end of any.
     static std::vector<Placement> PlacePlanes(const ImageLayout& oLayout, std::uint64_t nOffset, Order eOrder);

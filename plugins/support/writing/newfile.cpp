@@ -15,7 +15,7 @@ namespace krv::plugins::support
 namespace
 {
 
-// Of no length that a folder does not take.
+// The name is of no length that a folder does not take.
 std::string MakeTemporaryName(const std::string& fileName, bool bReplace, const Place& oPlace)
 {
     struct stat oStatus = {};

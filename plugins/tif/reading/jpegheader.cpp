@@ -97,7 +97,7 @@ bool JpegHeader::ReadTables(Bytes oSegment, bool bHuffman)
         if (nPlace >= PLACES || nClass > 1 || nBytes > oSegment.size())
             return false;
         const unsigned int nKind = !bHuffman ? eQuantisation : nClass == 0 ? eDc : eAc;
-        maTables[nKind + nPlace] = oSegment.first(nBytes);
+        moTables[nKind + nPlace] = oSegment.first(nBytes);
         oSegment = oSegment.subspan(nBytes);
     }
     return true;
@@ -185,7 +185,7 @@ bool JpegCompleter::Complete(std::span<unsigned char>& oStream)
     moComplete.assign({MARKER, START_OF_IMAGE});
     for (unsigned int nTable = 0; nTable < JpegHeader::TABLES; ++nTable)
     {
-        const Bytes oTable = moHeader.Has(nTable) ? moHeader.maTables[nTable] : GetStandardTable(nTable);
+        const Bytes oTable = moHeader.Has(nTable) ? moHeader.moTables[nTable] : GetStandardTable(nTable);
         if (oHeader.Has(nTable) || (oHeader.mbFirstScanIsAll && !aWanted[nTable]))
             continue;
         if (!oTable.empty())

@@ -38,14 +38,14 @@ struct JpegHeader
     // Never fails: what makes no sense ends the reading.
     static JpegHeader Read(Bytes oStream);
 
-    bool Has(unsigned int nTable) const { return !maTables[nTable].empty(); }
+    bool Has(unsigned int nTable) const { return !moTables[nTable].empty(); }
 
     // Whether it ended at its first pixels or at its end.
     bool mbWhole = false;
     bool mbFirstScanIsAll = false;       // no further scans, no tables between them
     std::vector<Component> moComponents; // none without a frame
     // By kind plus place: a table as it is stored, from the byte with its place on. Empty: not there.
-    std::array<Bytes, TABLES> maTables;
+    std::array<Bytes, TABLES> moTables;
 
 private:
     bool ReadTables(Bytes oSegment, bool bHuffman);
@@ -71,7 +71,7 @@ private:
     std::vector<unsigned char> moComplete;
 };
 
-// The standard's Huffman table: nTable is the kind plus place 0 (brightness) or 1 (colour), the form that of maTables.
+// The standard's Huffman table: nTable is the kind plus place 0 (brightness) or 1 (colour), the form that of moTables.
 std::span<const unsigned char> GetStandardTable(unsigned int nTable);
 
 } // namespace krv::plugins::tif

@@ -82,7 +82,7 @@ public:
     PeekReader& GetReader() { return *mpoReader; }
     TIFF* GetTiff() const { return GetHandle().Get(); }
     TiffHandle& GetHandle() const;
-    // Of tag 347, as long as the page is there; none when there is none.
+    // The tables of tag 347, as long as the page is there; none when there is none.
     std::span<const unsigned char> GetJpegTables() const;
     StrileTable& GetStriles() { return *mpoStriles; }
 

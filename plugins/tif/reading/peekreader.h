@@ -24,7 +24,7 @@ public:
     std::size_t Read(std::uint64_t nOffset, void* pTarget, std::size_t nBytes);
 
     // What is read from now on is read from the file anew.
-    void Forget() { maWindows[0].mnBytes = maWindows[1].mnBytes = 0; }
+    void Forget() { moWindows[0].mnBytes = moWindows[1].mnBytes = 0; }
 
 private:
     static constexpr std::size_t WINDOW_BYTES = 4096;
@@ -33,7 +33,7 @@ private:
     {
         std::uint64_t mnOffset = 0;
         std::size_t mnBytes = 0;
-        std::array<unsigned char, WINDOW_BYTES> maBytes;
+        std::array<unsigned char, WINDOW_BYTES> moBytes;
 
         bool Holds(std::uint64_t nOffset, std::size_t nBytes) const
         {
@@ -42,7 +42,7 @@ private:
     };
 
     const support::File& moFile;
-    Window maWindows[2];
+    Window moWindows[2];
     unsigned int mnNext = 0;
 };
 

@@ -17,16 +17,16 @@ struct TiffHandle::Client
 {
     PeekReader& moReader;
     std::size_t mnHeaderBytes;
-    unsigned char maHeader[FileHeader::BYTES] = {};
+    unsigned char moHeader[FileHeader::BYTES] = {};
     std::uint64_t mnPosition = 0;
-    char maCause[512] = {}; // of the reader below libtiff
+    char moLastCause[512] = {}; // of the reader below libtiff
     bool mbUnknownKind = false;
     bool mbLostData = false;
 
     Client(PeekReader& oReader, const FileHeader& oHeader, std::uint64_t nDirectory)
         : moReader(oReader), mnHeaderBytes(oHeader.GetBytes())
     {
-        oHeader.Write(maHeader, nDirectory);
+        oHeader.Write(moHeader, nDirectory);
     }
 
     static Client& From(thandle_t pClient) { return *static_cast<Client*>(pClient); }
@@ -48,7 +48,7 @@ struct TiffHandle::Client
             if (nBegin < oClient.mnHeaderBytes)
             {
                 const auto nCopy = std::min<std::size_t>(nLeft, oClient.mnHeaderBytes - nBegin);
-                std::memcpy(pBytes, oClient.maHeader + nBegin, nCopy);
+                std::memcpy(pBytes, oClient.moHeader + nBegin, nCopy);
                 pBytes += nCopy;
                 nLeft -= nCopy;
                 oClient.mnPosition += nCopy;
@@ -59,8 +59,8 @@ struct TiffHandle::Client
         }
         catch (const std::exception& oException)
         {
-            if (oClient.maCause[0] == '\0')
-                std::snprintf(oClient.maCause, sizeof(oClient.maCause), "%s", oException.what());
+            if (oClient.moLastCause[0] == '\0')
+                std::snprintf(oClient.moLastCause, sizeof(oClient.moLastCause), "%s", oException.what());
         }
         return -1;
     }
@@ -121,7 +121,7 @@ struct TiffHandle::Client
 
 void TiffHandle::Forget()
 {
-    mpoClient->maCause[0] = '\0';
+    mpoClient->moLastCause[0] = '\0';
     mpoClient->mbUnknownKind = false;
     mpoClient->mbLostData = false;
 }
@@ -157,7 +157,7 @@ TiffHandle::~TiffHandle()
 
 TiffTrouble TiffHandle::TakeTrouble()
 {
-    const TiffTrouble oTrouble{mpoClient->maCause, mpoClient->mbUnknownKind, mpoClient->mbLostData};
+    const TiffTrouble oTrouble{mpoClient->moLastCause, mpoClient->mbUnknownKind, mpoClient->mbLostData};
     Forget();
     return oTrouble;
 }

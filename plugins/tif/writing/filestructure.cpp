@@ -106,7 +106,7 @@ void FileEditor::ReadPage(std::uint64_t nOffset, bool bBelowFirst, std::uint64_t
             GetFile()->Read(oEntry.mnOffset, oTag.moBytes.data(), oTag.moBytes.size());
         oTags.push_back(std::move(oTag));
     }
-    // Of a tag that is there twice the first counts, for readers too.
+    // The first of two tags of a number counts, for readers too.
     std::stable_sort(oTags.begin(), oTags.end(),
                      [](const Tag& oFirst, const Tag& oSecond) { return oFirst.mnTag < oSecond.mnTag; });
     oTags.erase(std::unique(oTags.begin(), oTags.end(),

@@ -55,7 +55,7 @@ struct Compressor
     jpeg_error_mgr moErrors{};
     jpeg_destination_mgr moTarget{};
     std::jmp_buf moFailed{};
-    char maMessage[JMSG_LENGTH_MAX] = {};
+    char moMessage[JMSG_LENGTH_MAX] = {};
     unsigned char* mpStream = nullptr;
     std::size_t mnRoom = 0;
 
@@ -74,7 +74,7 @@ struct Compressor
     static void OnError(j_common_ptr pState)
     {
         Compressor& oRun = From(pState);
-        pState->err->format_message(pState, oRun.maMessage);
+        pState->err->format_message(pState, oRun.moMessage);
         std::longjmp(oRun.moFailed, 1);
     }
     static void OnWarning(j_common_ptr, int) {}
@@ -101,8 +101,8 @@ struct Compressor
 struct JpegPlan
 {
     std::vector<Component> moComponents;
-    std::array<Bytes, JpegHeader::TABLES> maTables;    // without bytes: of the asked quality
-    std::array<bool, JpegHeader::TABLES> maRepeated{}; // written into the stream
+    std::array<Bytes, JpegHeader::TABLES> moTables;    // without bytes: of the asked quality
+    std::array<bool, JpegHeader::TABLES> moRepeated{}; // written into the stream
     bool mbOwnCodes = false;                           // Huffman tables are made for the pixels
     std::string moObstacle;
 };
@@ -151,7 +151,7 @@ bool Run(Compressor& oRun, const JpegPlan& oPlan, bool bColours, int nQuality, c
     for (unsigned int nPlace = 0; nPlace < JpegHeader::PLACES; ++nPlace)
     {
         JQUANT_TBL*& pTable = oState.quant_tbl_ptrs[nPlace];
-        const Bytes oBytes = oPlan.maTables[JpegHeader::eQuantisation + nPlace];
+        const Bytes oBytes = oPlan.moTables[JpegHeader::eQuantisation + nPlace];
         if (pTable == nullptr)
             pTable = jpeg_alloc_quant_table(reinterpret_cast<j_common_ptr>(&oState));
         if (nPlace > 1)
@@ -162,11 +162,11 @@ bool Run(Compressor& oRun, const JpegPlan& oPlan, bool bColours, int nQuality, c
             const unsigned int nValue = bWide ? oBytes[1 + 2 * nAt] * 256U + oBytes[2 + 2 * nAt] : oBytes[1 + nAt];
             pTable->quantval[ZIGZAG[nAt]] = static_cast<UINT16>(std::max(1U, nValue));
         }
-        pTable->sent_table = oPlan.maRepeated[JpegHeader::eQuantisation + nPlace] ? FALSE : TRUE;
+        pTable->sent_table = oPlan.moRepeated[JpegHeader::eQuantisation + nPlace] ? FALSE : TRUE;
     }
     for (unsigned int nTable = JpegHeader::eDc; nTable < JpegHeader::TABLES; ++nTable)
     {
-        const Bytes oBytes = oPlan.maTables[nTable];
+        const Bytes oBytes = oPlan.moTables[nTable];
         JHUFF_TBL*& pTable = (nTable < JpegHeader::eAc ? oState.dc_huff_tbl_ptrs : oState.ac_huff_tbl_ptrs)[nTable % 4];
         if (oBytes.empty())
             continue;
@@ -174,7 +174,7 @@ bool Run(Compressor& oRun, const JpegPlan& oPlan, bool bColours, int nQuality, c
             pTable = jpeg_alloc_huff_table(reinterpret_cast<j_common_ptr>(&oState));
         std::copy_n(oBytes.begin(), 1 + CODE_LENGTHS, pTable->bits);
         std::copy(oBytes.begin() + 1 + CODE_LENGTHS, oBytes.end(), pTable->huffval);
-        pTable->sent_table = oPlan.maRepeated[nTable] ? FALSE : TRUE;
+        pTable->sent_table = oPlan.moRepeated[nTable] ? FALSE : TRUE;
     }
     jpeg_start_compress(&oState, FALSE);
     const std::size_t nPitch = std::size_t{nWidth} * oPlan.moComponents.size();
@@ -249,7 +249,7 @@ void JpegEncoder::PlanCodes(JpegPlan& oPlan, const JpegHeader& oLike) const
 {
     const auto Serves = [&](unsigned int nTable)
     {
-        return IsShared(nTable, oLike) && IsComplete(moShared.maTables[nTable], nTable < JpegHeader::eAc);
+        return IsShared(nTable, oLike) && IsComplete(moShared.moTables[nTable], nTable < JpegHeader::eAc);
     };
     const bool bShared =
         std::all_of(oPlan.moComponents.begin(), oPlan.moComponents.end(),
@@ -269,8 +269,8 @@ void JpegEncoder::PlanCodes(JpegPlan& oPlan, const JpegHeader& oLike) const
             nPlace = nFree % JpegHeader::PLACES;
             bMoved = true;
         }
-        oPlan.maTables[nKind + nPlace] = bShared ? moShared.maTables[nTable] : GetStandardTable(nKind + nPlace % 2);
-        oPlan.maRepeated[nKind + nPlace] = !bShared;
+        oPlan.moTables[nKind + nPlace] = bShared ? moShared.moTables[nTable] : GetStandardTable(nKind + nPlace % 2);
+        oPlan.moRepeated[nKind + nPlace] = !bShared;
     };
     for (Component& oComponent : oPlan.moComponents)
     {
@@ -280,7 +280,7 @@ void JpegEncoder::PlanCodes(JpegPlan& oPlan, const JpegHeader& oLike) const
     // Streams without any Huffman table go by the standard's; one of another kind would stay with a reader.
     const bool bBare =
         !oLike.moComponents.empty() &&
-        std::all_of(oLike.maTables.begin() + JpegHeader::eDc, oLike.maTables.end(), [](Bytes o) { return o.empty(); });
+        std::all_of(oLike.moTables.begin() + JpegHeader::eDc, oLike.moTables.end(), [](Bytes o) { return o.empty(); });
     oPlan.mbOwnCodes = !bShared && (bMoved || !bBare);
 }
 
@@ -299,8 +299,8 @@ JpegPlan JpegEncoder::MakePlan(const JpegHeader& oLike) const
     {
         const unsigned int nTable = JpegHeader::eQuantisation + oComponent.mnQuantisation;
         const bool bShared = IsShared(nTable, oLike);
-        oPlan.maTables[nTable] = bShared ? moShared.maTables[nTable] : oLike.maTables[nTable];
-        oPlan.maRepeated[nTable] = !bShared;
+        oPlan.moTables[nTable] = bShared ? moShared.moTables[nTable] : oLike.moTables[nTable];
+        oPlan.moRepeated[nTable] = !bShared;
     }
     return oPlan;
 }
@@ -313,7 +313,7 @@ std::span<const unsigned char> JpegEncoder::Encode(const unsigned char* pPixels,
     const bool bColours = moForm.mnPhotometric == PHOTOMETRIC_YCBCR;
     if (!oPlan.moObstacle.empty() || !Run(oRun, oPlan, bColours, mnQuality, pPixels, moForm.mnStrileWidth, nRows))
         throw IOException(moPage.GetFileName(), moPage.GetFileName() + ": encoding failed: " +
-                                                    (oPlan.moObstacle.empty() ? oRun.maMessage : oPlan.moObstacle));
+                                                    (oPlan.moObstacle.empty() ? oRun.moMessage : oPlan.moObstacle));
     moStream.assign(oRun.mpStream, oRun.mpStream + oRun.GetBytes());
     return moStream;
 }

@@ -21,7 +21,7 @@ struct Memory
 {
     std::vector<unsigned char> moBytes;
     std::uint64_t mnPosition = 0;
-    char maMessage[512] = {};
+    char moMessage[512] = {};
 
     static Memory& From(thandle_t pClient) { return *static_cast<Memory*>(pClient); }
 
@@ -66,7 +66,7 @@ struct Memory
     static toff_t Size(thandle_t pClient) noexcept { return From(pClient).moBytes.size(); }
     static int OnError(TIFF*, void* pClient, const char*, const char* pFormat, va_list oArguments) noexcept
     {
-        std::vsnprintf(From(pClient).maMessage, sizeof(maMessage), pFormat, oArguments);
+        std::vsnprintf(From(pClient).moMessage, sizeof(moMessage), pFormat, oArguments);
         return 1;
     }
     static int OnWarning(TIFF*, void*, const char*, const char*, va_list) noexcept { return 1; }
@@ -137,7 +137,7 @@ std::vector<unsigned char> EncodeByLibrary(const PageForm& oForm, std::optional<
     Memory oMemory;
     const Handle poTiff = Open(oMemory, oForm.mbBigEndian);
     if (!poTiff)
-        throw IOException(fileName, fileName + ": encoding failed: " + oMemory.maMessage);
+        throw IOException(fileName, fileName + ": encoding failed: " + oMemory.moMessage);
     Describe(poTiff.get(), oForm, nRows, oLevel);
     // libtiff works in the memory that it is given.
     std::vector<unsigned char> oRows(pStored, pStored + nBytes);
@@ -145,7 +145,7 @@ std::vector<unsigned char> EncodeByLibrary(const PageForm& oForm, std::optional<
     const tmsize_t nDone = oForm.mbTiled ? TIFFWriteEncodedTile(poTiff.get(), 0, oRows.data(), nSize)
                                          : TIFFWriteEncodedStrip(poTiff.get(), 0, oRows.data(), nSize);
     if (nDone < 0 || TIFFFlushData(poTiff.get()) != 1)
-        throw IOException(fileName, fileName + ": encoding failed: " + oMemory.maMessage);
+        throw IOException(fileName, fileName + ": encoding failed: " + oMemory.moMessage);
     const std::uint64_t nOffset = TIFFGetStrileOffset(poTiff.get(), 0);
     const std::uint64_t nCoded = TIFFGetStrileByteCount(poTiff.get(), 0);
     if (nCoded == 0 || nOffset + nCoded > oMemory.moBytes.size())

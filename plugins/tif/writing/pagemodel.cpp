@@ -41,7 +41,7 @@ std::uint16_t GetSampleFormat(const krv::gobs::DataType& oType)
     return oType.IsSigned() ? SAMPLEFORMAT_INT : SAMPLEFORMAT_UINT;
 }
 
-// Of one sample as it is stored: narrower than the type only where the type comes back when it is read.
+// The bits of one sample as it is stored: narrower than the type only where the type comes back when it is read.
 unsigned int ChooseBits(const NewImage& oImage, const CreateOptions& oOptions, const Place& oPlace)
 {
     constexpr unsigned int MOST_PACKED_BITS = 32;

@@ -56,7 +56,7 @@ Store::Store(std::uint64_t nBudget)
 TileStatistics Store::GetStatistics()
 {
     TileStatistics oStatistics;
-    for (Shard& oShard : maShards)
+    for (Shard& oShard : moShards)
     {
         const std::lock_guard oLock(oShard.moMutex);
         oStatistics.mnHits += oShard.mnHits;
@@ -72,7 +72,7 @@ TileStatistics Store::GetStatistics()
 
 void Store::ResetStatistics()
 {
-    for (Shard& oShard : maShards)
+    for (Shard& oShard : moShards)
     {
         const std::lock_guard oLock(oShard.moMutex);
         oShard.mnHits = oShard.mnMisses = oShard.mnWaits = oShard.mnEvictions = 0;
@@ -165,7 +165,7 @@ bool Store::Remove(Shard& oShard, Entry& oEntry)
 template <typename Test>
 void Store::RemoveIf(const Test& oTest)
 {
-    for (Shard& oShard : maShards)
+    for (Shard& oShard : moShards)
     {
         Entry* poGone = nullptr;
         {
@@ -329,7 +329,7 @@ bool Store::EvictOne(Entry* poTaker)
         std::size_t nAt = 0;
         for (std::size_t nList = 0; nList < 2 * SHARDS; ++nList)
         {
-            std::uint64_t nStamp = maShards[nList / 2].maOldest[nList % 2].load(std::memory_order_relaxed);
+            std::uint64_t nStamp = moShards[nList / 2].moOldest[nList % 2].load(std::memory_order_relaxed);
             if (nStamp == Shard::NOTHING || oTried[nList])
                 continue;
             if (nStamp != Entry::RETIRED && (nList % 2 == Shard::eReduced) != bFrames)
@@ -342,7 +342,7 @@ bool Store::EvictOne(Entry* poTaker)
         }
         if (nBest == Shard::NOTHING)
             return false;
-        if (EvictFrom(maShards[nAt / 2], nAt % 2, poTaker))
+        if (EvictFrom(moShards[nAt / 2], nAt % 2, poTaker))
             return true;
         oTried[nAt] = true;
     }

@@ -49,7 +49,7 @@ private:
     // So many that eight threads seldom want the same.
     static constexpr std::size_t SHARDS = 64;
 
-    Shard& GetShard(const TileKey& oKey) { return maShards[oKey.Hash() % SHARDS]; }
+    Shard& GetShard(const TileKey& oKey) { return moShards[oKey.Hash() % SHARDS]; }
     std::uint64_t Now() const { return mnClock.load(std::memory_order_relaxed); }
     [[nodiscard]] bool Remove(Shard& oShard, Entry& oEntry);
     template <typename Test>
@@ -63,7 +63,7 @@ private:
 
     std::unique_ptr<Ledger> mpoOwnLedger;
     Ledger& moLedger;
-    std::array<Shard, SHARDS> maShards;
+    std::array<Shard, SHARDS> moShards;
     alignas(64) std::atomic<std::uint64_t> mnClock{Entry::RETIRED + 1}; // counts tiles to be made
     std::atomic<std::uint64_t> mnFrames{0};                             // bytes of entries that are reduced
     std::atomic<std::uint64_t> mnOwners{0};

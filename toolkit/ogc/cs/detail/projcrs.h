@@ -39,7 +39,7 @@ public:
 
     const PJ* GetObject() const { return mpoObject.get(); }
 
-    // Of the heights; 0 when there are none or none with a code, and when the whole has one that says them.
+    // The code of the heights; 0 when there are none or none with a code, and when the whole has one that says them.
     int GetVerticalEPSG() const;
     // The geographic system below: codes of it and of its datum, name and shift.
     GeodeticParts GetBase() const;
