@@ -28,6 +28,7 @@ function indent(line)
 # The name that a declaration without initialiser ends with.
 function declared(text)
 {
+    sub(/alignas\([^)]*\) */, "", text);
     while (gsub(/<[^<>]*>/, "", text))
         ;
     sub(/ *(=|\{).*$/, "", text);

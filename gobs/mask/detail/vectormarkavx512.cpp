@@ -27,15 +27,15 @@ constexpr std::size_t TAKEN = 64; // pixels
 template <std::size_t BYTES>
 struct Repeated
 {
-    alignas(64) unsigned char maBytes[4 * BYTES];
+    alignas(64) unsigned char moBytes[4 * BYTES];
 
     explicit Repeated(const unsigned char* pPattern)
     {
         for (std::size_t n = 0; n < 4; ++n)
-            std::memcpy(maBytes + n * BYTES, pPattern, BYTES);
+            std::memcpy(moBytes + n * BYTES, pPattern, BYTES);
     }
 
-    __m512i Get(std::size_t nVector) const { return _mm512_load_si512(maBytes + 64 * nVector); }
+    __m512i Get(std::size_t nVector) const { return _mm512_load_si512(moBytes + 64 * nVector); }
 };
 
 template <class Sample>

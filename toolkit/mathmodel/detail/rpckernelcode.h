@@ -106,42 +106,42 @@ bool ToImage(const RpcCoefficients& oModel, std::size_t nCount, const double* pL
 // A polynomial of longitude and latitude at the height of each point: 1, L, P, LL, LP, PP, LLL, LLP, LPP, PPP.
 struct AtHeight
 {
-    alignas(64) Lanes maTerms[10];
+    alignas(64) Lanes moTerms[10];
 
     void Set(const double* pC, const double* pH, std::size_t nLanes)
     {
         for (std::size_t i = 0; i < nLanes; ++i)
         {
             const double nH = pH[i];
-            maTerms[0][i] = pC[0] + nH * (pC[3] + nH * (pC[9] + nH * pC[19]));
-            maTerms[1][i] = pC[1] + nH * (pC[5] + nH * pC[13]);
-            maTerms[2][i] = pC[2] + nH * (pC[6] + nH * pC[16]);
-            maTerms[3][i] = pC[7] + nH * pC[17];
-            maTerms[4][i] = pC[4] + nH * pC[10];
-            maTerms[5][i] = pC[8] + nH * pC[18];
-            maTerms[6][i] = pC[11];
-            maTerms[7][i] = pC[14];
-            maTerms[8][i] = pC[12];
-            maTerms[9][i] = pC[15];
+            moTerms[0][i] = pC[0] + nH * (pC[3] + nH * (pC[9] + nH * pC[19]));
+            moTerms[1][i] = pC[1] + nH * (pC[5] + nH * pC[13]);
+            moTerms[2][i] = pC[2] + nH * (pC[6] + nH * pC[16]);
+            moTerms[3][i] = pC[7] + nH * pC[17];
+            moTerms[4][i] = pC[4] + nH * pC[10];
+            moTerms[5][i] = pC[8] + nH * pC[18];
+            moTerms[6][i] = pC[11];
+            moTerms[7][i] = pC[14];
+            moTerms[8][i] = pC[12];
+            moTerms[9][i] = pC[15];
         }
     }
 
     double Value(std::size_t i, double nL, double nP) const
     {
-        return maTerms[0][i] +
-               nL * (maTerms[1][i] + nL * (maTerms[3][i] + nL * maTerms[6][i] + nP * maTerms[7][i]) +
-                     nP * (maTerms[4][i] + nP * maTerms[8][i])) +
-               nP * (maTerms[2][i] + nP * (maTerms[5][i] + nP * maTerms[9][i]));
+        return moTerms[0][i] +
+               nL * (moTerms[1][i] + nL * (moTerms[3][i] + nL * moTerms[6][i] + nP * moTerms[7][i]) +
+                     nP * (moTerms[4][i] + nP * moTerms[8][i])) +
+               nP * (moTerms[2][i] + nP * (moTerms[5][i] + nP * moTerms[9][i]));
     }
     double ByLongitude(std::size_t i, double nL, double nP) const
     {
-        return maTerms[1][i] + nL * (2 * maTerms[3][i] + 3 * nL * maTerms[6][i] + 2 * nP * maTerms[7][i]) +
-               nP * (maTerms[4][i] + nP * maTerms[8][i]);
+        return moTerms[1][i] + nL * (2 * moTerms[3][i] + 3 * nL * moTerms[6][i] + 2 * nP * moTerms[7][i]) +
+               nP * (moTerms[4][i] + nP * moTerms[8][i]);
     }
     double ByLatitude(std::size_t i, double nL, double nP) const
     {
-        return maTerms[2][i] + nP * (2 * maTerms[5][i] + 3 * nP * maTerms[9][i] + 2 * nL * maTerms[8][i]) +
-               nL * (maTerms[4][i] + nL * maTerms[7][i]);
+        return moTerms[2][i] + nP * (2 * moTerms[5][i] + 3 * nP * moTerms[9][i] + 2 * nL * moTerms[8][i]) +
+               nL * (moTerms[4][i] + nL * moTerms[7][i]);
     }
 };
 
