@@ -9,8 +9,8 @@ namespace krv::plugins::support
 {
 
 // A file that comes into being: under a temporary name in its folder, of this process alone, until it is whole and
-// takes its own. One that goes before is removed. The temporary name is .NAME.PROCESS.COUNT.part: so it lies on the file
-// system of its name, is cleared away by hand after a crash, and is taken for an image by nobody.
+// takes its own. One that goes before is removed. The temporary name is .NAME.PROCESS.COUNT.part: so it lies on the
+// file system of its name, is cleared away by hand after a crash, and is taken for an image by nobody.
 class NewFile
 {
 public:
