@@ -202,13 +202,17 @@ std::string Describe(const std::string& file, const krv::Exception** ppError)
     {
         return WithFile(file, "there is not enough memory; a smaller tile or size may do");
     }
+    catch (const krv::xml::ParseError& oError)
+    {
+        return XmlText(oError.what());
+    }
     catch (const std::exception& oError)
     {
-        return krv::xml::IsParseException(oError) ? XmlText(oError.what()) : WithFile(file, oError.what());
+        return WithFile(file, oError.what());
     }
     catch (...)
     {
-        return XmlText(krv::xml::DescribeCurrentException());
+        return WithFile(file, "unknown error");
     }
 }
 
