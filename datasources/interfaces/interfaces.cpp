@@ -2,6 +2,7 @@
 // the rule that goes with an interface.
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/iblockencoding.h"
+#include "datasources/interfaces/iblocktransfer.h"
 #include "datasources/interfaces/ichannelfilter.h"
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
@@ -32,6 +33,7 @@ namespace krv::datasources
 IBitmapDataset::~IBitmapDataset() = default;
 IBlockEncoder::~IBlockEncoder() = default;
 IBlockEncoding::~IBlockEncoding() = default;
+IBlockTransfer::~IBlockTransfer() = default;
 IChannelFilter::~IChannelFilter() = default;
 IChannelInfo::~IChannelInfo() = default;
 IDataset::~IDataset() = default;

@@ -98,6 +98,15 @@ void TileSource::Verify(Work& oWork, const Spot& oSpot, const TileTable::Tile& o
     oWork.mpoTable->SetVerified(oTile);
 }
 
+// In one state of a file the place of a table tells its tiles from all others; those of empty tables are all alike.
+support::BlockOrigin TileSource::GetOrigin() const
+{
+    std::string image = "KRVDSK";
+    for (const std::unique_ptr<Work>& poWork : moWorks)
+        image += " " + std::to_string(poWork->mpoTable->GetTop().mnOffset);
+    return {moOrigin.mpoStore->ShareFile(), std::move(image)};
+}
+
 void TileSource::ReadBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
                            std::size_t nPitch)
 {

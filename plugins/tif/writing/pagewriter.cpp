@@ -182,6 +182,16 @@ void PageWriter::StoreCoded(std::uint64_t nStrile, const unsigned char* pBytes, 
     moReader.Forget();
 }
 
+void PageWriter::CopyCoded(const support::File& oSource, const std::vector<CodedStrile>& oStriles)
+{
+    CheckPage();
+    NoteChange();
+    mpoEditor->CopyStriles(*mpoModel, oSource, oStriles);
+    for (const CodedStrile& oStrile : oStriles)
+        moHeld.Forget(oStrile.mnNumber);
+    moReader.Forget();
+}
+
 void PageWriter::ReadStored(const Strile& oStrile, unsigned char* pTarget, std::size_t nPitch)
 {
     const support::ImageLayout& oLayout = GetLayout();

@@ -1,5 +1,6 @@
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/iblockencoding.h"
+#include "datasources/interfaces/iblocktransfer.h"
 #include "datasources/interfaces/ichannelfilter.h"
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
@@ -124,6 +125,7 @@ std::vector<Table> Tables()
           Slot(&IEncodedBlocks::SetEncodedForm), Slot(&IEncodedBlocks::StoreEncoded)}},
         {"IBlockEncoder", {Slot(&IBlockEncoder::Encode)}},
         {"IBlockEncoding", {Slot(&IBlockEncoding::MakeBlockEncoder)}},
+        {"IBlockTransfer", {Slot(&IBlockTransfer::TakeBlocks)}},
         {"IHistoryIO",
          {Slot(&IHistoryIO::ReadHistory), Slot(&IHistoryIO::AppendHistory), Slot(&IHistoryIO::ClearHistory)}},
         {"IMathModelDataset",
