@@ -155,8 +155,11 @@ unsigned int Catalogue::CountChannels() const
 
 std::string Catalogue::FindObstacle(const Plane& oPlane) const
 {
-    const std::uint64_t nRowBits = std::min(mnBlockWidth, moSize.mnWidth) * oPlane.GetPixelBits();
-    const std::uint64_t nBytes = (nRowBits + 7) / 8 * std::min(mnBlockHeight, moSize.mnHeight);
+    const bool bWhole = oPlane.meStorage == Storage::eWholeTiles;
+    const std::uint64_t nRowBits =
+        (bWhole ? mnBlockWidth : std::min(mnBlockWidth, moSize.mnWidth)) * oPlane.GetPixelBits();
+    const std::uint64_t nBytes =
+        (nRowBits + 7) / 8 * (bWhole ? mnBlockHeight : std::min(mnBlockHeight, moSize.mnHeight));
     if (nBytes > LARGEST_TILE)
         return "a tile would be of " + std::to_string(nBytes) + " bytes, more than " + std::to_string(LARGEST_TILE);
     if (CountTiles(moSize) > MOST_TILES)
@@ -320,8 +323,8 @@ std::shared_ptr<Plane> Catalogue::ReadPlane(BytesReader& oItem, bool bBitmap) co
     const std::uint64_t nStorage = oItem.ReadNumber(1), nType = oItem.ReadNumber(1), nCoding = oItem.ReadNumber(1);
     poPlane->mnPredictor = static_cast<std::uint8_t>(oItem.ReadNumber(1));
     poPlane->mnCodingLevel = static_cast<std::uint8_t>(oItem.ReadNumber(1));
-    if (nStorage > static_cast<std::uint64_t>(Storage::eTiles) || nType > krv::gobs::eDT_BIT ||
-        (nType == krv::gobs::eDT_BIT) != bBitmap || nCoding >= std::size(CODING_NAMES))
+    if (nStorage > static_cast<std::uint64_t>(bBitmap ? Storage::eTiles : Storage::eWholeTiles) ||
+        nType > krv::gobs::eDT_BIT || (nType == krv::gobs::eDT_BIT) != bBitmap || nCoding >= std::size(CODING_NAMES))
         oItem.Fail("channels of storage " + std::to_string(nStorage) + ", type " + std::to_string(nType) +
                    " and coding " + std::to_string(nCoding) + " cannot be");
     poPlane->meStorage = static_cast<Storage>(nStorage);

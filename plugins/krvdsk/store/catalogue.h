@@ -33,7 +33,8 @@ const char* GetCodingName(Coding eCoding);
 // Where the pixels of a plane are. The values are those of the file.
 enum class Storage : std::uint8_t
 {
-    eTiles = 0
+    eTiles = 0,     // tiles hold what of them lies in the image
+    eWholeTiles = 1 // all tiles are of one size, as those of TIFF are
 };
 
 // Channels of one type that are stored together, pixel interleaved, with their levels; or a bitmap.
@@ -145,6 +146,8 @@ struct Catalogue
     std::shared_ptr<Plane> MakePlane(const krv::gobs::DataType& oType, unsigned int nChannels, const std::string& name,
                                      const Place& oPlace) const;
     std::shared_ptr<Plane> MakeBitmapPlane() const;
+    // Why tiles of such a plane cannot be; empty when they can.
+    std::string FindObstacle(const Plane& oPlane) const;
     // Gives the tables their names for messages, which count channels.
     void Describe() const;
     static std::string DescribePlane(unsigned int nFirst, unsigned int nChannels);
@@ -154,8 +157,6 @@ private:
     std::shared_ptr<Plane> ReadPlane(BytesReader& oItem, bool bBitmap) const;
     void ReadSegment(BytesReader oItem);
     void ReadLink(BytesReader oItem);
-    // Why tiles of such a plane cannot be; empty when they can.
-    std::string FindObstacle(const Plane& oPlane) const;
 };
 
 // Metadata, descriptions and histories of channels, as they are stored.
