@@ -161,6 +161,10 @@ private:
     template <class Facet>
     Facet* FindLinkedSegment(const std::string& kind, unsigned int nNumber,
                              std::vector<unsigned int> (Facet::*pList)() const) const;
+    void TakeLevel(unsigned int nLevel, krv::datasources::IOverviewManager& oTheirs);
+    void TakeBitmap(unsigned int nBitmap);
+    // Of a bitmap that comes, none of whose levels is valid.
+    krv::datasources::MetadataMap MakeBitmapTags(const krv::datasources::MetadataMap& oMetadata) const;
     void ShowImage();
     std::shared_ptr<support::IBlockSource> MakeSource(std::vector<std::shared_ptr<Plane>> oPlanes, unsigned int nLevel,
                                                       const ImageSize& oSize, std::function<void()> oBeforeWrite) const;

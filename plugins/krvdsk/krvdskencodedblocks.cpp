@@ -237,7 +237,7 @@ void KrvdskDataset::LayOutLevel(unsigned int nLevel, const ImageSize& oSize)
     Catalogue& oCatalogue = mpoWriter->GetCatalogue();
     if (nLevel != 1)
         oCatalogue.moLevels[nLevel] = oSize;
-    for (const std::shared_ptr<Plane>& poPlane : oCatalogue.moPlanes)
+    for (const std::shared_ptr<Plane>& poPlane : nLevel == 1 ? oCatalogue.moPlanes : oCatalogue.GetLevelPlanes())
         poPlane->moTables[nLevel] = oCatalogue.MakeTable(oSize);
     oCatalogue.Describe();
     mpoWriter->Touch();

@@ -50,12 +50,13 @@ std::string Sum(IRasterIO* poIO, std::size_t nPixelBytes)
     return std::to_string(nWidth) + " x " + std::to_string(nHeight) + " " + std::to_string(nSum) + "\n";
 }
 
-// Without the book of levels, which their manager tells.
+// Without the book of levels, which their manager tells, the text of a model, which the models do, and values that say
+// nothing.
 std::string Text(const MetadataMap& oMap)
 {
     std::string text;
     for (const auto& [key, value] : oMap)
-        if (!key.starts_with("_Overview_"))
+        if (!key.starts_with("_Overview_") && key != "RPC" && !value.empty())
             text += key + "=" + value + "\n";
     return text;
 }
@@ -109,14 +110,23 @@ std::string TellBitmaps(IBitmapDataset& oBitmaps)
     return text;
 }
 
+// Some formats repeat the last colour until there is one for each value of the type.
 std::string TellPCTs(const IPCTDataset& oTables)
 {
+    const auto Repeats = [](const krv::gobs::PCT::Entry& oFirst, const krv::gobs::PCT::Entry& oSecond)
+    {
+        return oFirst.colour.red == oSecond.colour.red && oFirst.colour.green == oSecond.colour.green &&
+               oFirst.colour.blue == oSecond.colour.blue && oFirst.alpha == oSecond.alpha;
+    };
     std::string text;
     for (const unsigned int nTable : oTables.GetPCTList())
     {
         const std::unique_ptr<krv::gobs::PCT> poTable(oTables.GetPCT(nTable));
         text += "PCT of " + std::to_string(oTables.GetPCTChannel(nTable)) + oTables.GetPCTDescription(nTable) + ": ";
-        for (const krv::gobs::PCT::Entry& oEntry : poTable->GetEntries())
+        auto oEntries = poTable->GetEntries();
+        while (oEntries.size() > 1 && Repeats(*std::prev(oEntries.end(), 2), oEntries.back()))
+            oEntries.pop_back();
+        for (const krv::gobs::PCT::Entry& oEntry : oEntries)
             text +=
                 Numbers(std::vector<double>{oEntry.low, oEntry.high, 1.0 * oEntry.colour.red, 1.0 * oEntry.colour.green,
                                             1.0 * oEntry.colour.blue, 1.0 * oEntry.alpha});

@@ -49,7 +49,8 @@ public:
     // Writes the pages that changed.
     void WritePages(StoreWriter& oWriter);
     bool IsChanged() const { return moTop.mbChanged; }
-    // Whether nothing was ever stored.
+    void Touch() { moTop.mbChanged = true; }
+    // Whether nothing is stored, or on its way.
     bool IsEmpty() const { return !GetTop().IsStored() && !moTop.mbChanged; }
 
     // Every stored page and tile, pages before what they name. nTile: UINT64_MAX for a page. Pages that are not in

@@ -211,7 +211,7 @@ TEST(KrvdskReaders, EightProcessesSeeWholeStatesBesideAWriter)
             ::_exit(nCode);
         }
         unsigned int nState = 0;
-        const unsigned int nLast = 12 * Rounds();
+        const unsigned int nLast = 4 * Rounds();
         while (nState < nLast)
         {
             const NativePointer poWriter = OpenNative(fileName, eUpdate);
