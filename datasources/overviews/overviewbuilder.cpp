@@ -154,6 +154,8 @@ bool OverviewBuilder::PrepareMask(unsigned int nFactor)
 {
     const std::vector<unsigned int> oExisting = mpoMaskManager->GetLevels();
     bool bThere = std::find(oExisting.begin(), oExisting.end(), nFactor) != oExisting.end();
+    if (bThere)
+        mpoMaskManager->SetValid(mnMask, nFactor, false);
     if (bThere && (mpoMaskManager->GetLevelWidth(nFactor) != LevelSize(moForm.mnWidth, nFactor) ||
                    mpoMaskManager->GetLevelHeight(nFactor) != LevelSize(moForm.mnHeight, nFactor)))
     {
@@ -162,8 +164,6 @@ bool OverviewBuilder::PrepareMask(unsigned int nFactor)
     }
     if (!bThere)
         mpoMaskManager->CreateLevel(nFactor);
-    else
-        mpoMaskManager->SetValid(mnMask, nFactor, false);
     return bThere;
 }
 
@@ -192,6 +192,8 @@ void OverviewBuilder::Prepare(const std::vector<unsigned int>& oFactors)
         oLevel.mbWhole = std::find(oExisting.begin(), oExisting.end(), nFactor) == oExisting.end();
         if (!oLevel.mbWhole)
         {
+            // Before all else: what lies in another file becomes this one's then.
+            mpoAccessor->SetLevelValid(nFactor, false);
             oLevel.mpoWriter.reset(mpoAccessor->CreateRasterWriter(nFactor));
             if (oLevel.mpoWriter->GetWidth() != nWidth || oLevel.mpoWriter->GetHeight() != nHeight)
             {
@@ -202,8 +204,6 @@ void OverviewBuilder::Prepare(const std::vector<unsigned int>& oFactors)
         }
         if (oLevel.mbWhole)
             mpoAccessor->CreateLevel(nFactor);
-        else
-            mpoAccessor->SetLevelValid(nFactor, false);
         if (mnMask != 0 && !PrepareMask(nFactor))
             oLevel.mbWhole = true;
         oLevel.moBounds = oLevel.mbWhole ? PixelBounds{0, 0, nWidth, nHeight} : GetChanged(nFactor);

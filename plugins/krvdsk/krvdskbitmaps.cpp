@@ -150,6 +150,15 @@ krv::datasources::IRasterIO* KrvdskDataset::GetBitmapIO(const std::vector<unsign
     return new support::StackedIO(std::move(oParts), 1, 1);
 }
 
+krv::datasources::MetadataMap KrvdskDataset::MakeBitmapTags(const krv::datasources::MetadataMap& oMetadata) const
+{
+    krv::datasources::AuxiliaryData oBook(1);
+    oBook.SetChanMetadata(oMetadata, 1);
+    for (const auto& [nLevel, oSize] : GetCatalogue().moBitmapLevels)
+        SetLevelValid(oBook, 1, nLevel, false, {});
+    return oBook.GetChanMetadata(1);
+}
+
 unsigned int KrvdskDataset::CreateBitmap()
 {
     const Place oPlace = Place::Current();
@@ -157,10 +166,7 @@ unsigned int KrvdskDataset::CreateBitmap()
     Segment oSegment;
     oSegment.moKind = Segment::BITMAP;
     oSegment.mpoPlane = oCatalogue.MakeBitmapPlane();
-    krv::datasources::AuxiliaryData oBook(1);
-    for (const auto& [nLevel, oSize] : oCatalogue.moBitmapLevels)
-        SetLevelValid(oBook, 1, nLevel, false, {});
-    oSegment.moMetadata = oBook.GetChanMetadata(1);
+    oSegment.moMetadata = MakeBitmapTags({});
     oSegment.moDescription = "Bitmap " + std::to_string(oCatalogue.mnNextSegment);
     const unsigned int nBitmap = AddSegment(std::move(oSegment), oPlace);
     std::erase_if(moBitmaps, [](const auto& oOpened) { return oOpened.first.first == 0; });
@@ -215,24 +221,28 @@ void KrvdskDataset::SetBitmapMetadata(unsigned int nBitmap, const krv::datasourc
 
 krv::datasources::IOverviewManager* KrvdskDataset::GetBitmapOverviewManager()
 {
-    std::unique_ptr<krv::datasources::IOverviewManager> poOwn;
-    if (!ListSegments(Segment::BITMAP).empty())
-    {
-        if (!mpoBitmapLevels)
-            mpoBitmapLevels = std::make_shared<BitmapLevels>(*this);
-        poOwn = std::make_unique<support::OverviewManager>(*this, *mpoBitmapLevels);
-    }
     auto* const poLinked = mpoLink ? mpoLink->Find<krv::datasources::IBitmapDataset>() : nullptr;
+    if (GetBitmapList().empty())
+        return nullptr;
+    if (!mpoBitmapLevels)
+        mpoBitmapLevels = std::make_shared<BitmapLevels>(*this);
+    std::unique_ptr<krv::datasources::IOverviewManager> poOwn =
+        std::make_unique<support::OverviewManager>(*this, *mpoBitmapLevels);
     std::unique_ptr<krv::datasources::IOverviewManager> poTheirs(
         poLinked != nullptr ? poLinked->GetBitmapOverviewManager() : nullptr);
-    if (!poTheirs)
+    if (poLinked == nullptr || poLinked->GetBitmapList().empty())
         return poOwn.release();
-    const auto Source = [this](unsigned int nBitmap)
+    const auto FindSource = [this](unsigned int nBitmap, unsigned int)
     {
         return FindLinkedBitmap(nBitmap) != nullptr ? nBitmap : 0;
     };
-    return new LinkedLevels(mpoLink, std::move(poOwn), std::move(poTheirs), Source,
-                            static_cast<unsigned int>(GetBitmapList().size()));
+    const auto TakeOver = [this](unsigned int nBitmap, unsigned int)
+    {
+        for (const unsigned int nTheirs : nBitmap == 0 ? GetBitmapList() : std::vector<unsigned int>{nBitmap})
+            TakeBitmap(nTheirs);
+    };
+    return new LinkedLevels(mpoLink, std::move(poOwn), std::move(poTheirs),
+                            {FindSource, TakeOver, false, static_cast<unsigned int>(GetBitmapList().size())});
 }
 
 } // namespace krv::plugins::krvdsk

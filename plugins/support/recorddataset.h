@@ -37,6 +37,8 @@ protected:
     // For the format to call before pixels of the image change: makes the levels outdated, and once the file has its
     // name what is recorded of their values. Costs nothing when it did so already.
     void ForgetOldPixels();
+    // One of those that there are.
+    std::shared_ptr<BlockImage> OpenLevel(unsigned int nLevel) override;
     // A level is opened anew when it is wanted next.
     void ForgetOpened() { moOpened.clear(); }
 
@@ -51,7 +53,6 @@ protected:
 
 private:
     std::vector<Level> GetLevels() const override;
-    std::shared_ptr<BlockImage> OpenLevel(unsigned int nLevel) override;
     const krv::datasources::AuxiliaryData& GetBook() const override { return moRecord.moTags; }
     void MakeLevel(const Level& oLevel, const krv::datasources::AuxiliaryData& oBook, const Place& oPlace) override;
     void DropLevel(unsigned int nLevel, const krv::datasources::AuxiliaryData& oBook, const Place& oPlace) override;

@@ -1,4 +1,5 @@
 // The blocks of a TIFF file as bytes: the facets IEncodedBlocks and IBlockEncoding of its dataset.
+#include "datasources/metadata/levelbook.h"
 #include "plugins/tif/reading/pagesource.h"
 #include "plugins/tif/tifdataset.h"
 #include "plugins/tif/writing/blockencoder.h"
@@ -10,18 +11,6 @@
 
 namespace krv::plugins::tif
 {
-
-namespace
-{
-
-// Whether the sides of an image and of its level are those of the level's number.
-bool IsReduced(std::uint64_t nFull, std::uint64_t nReduced, unsigned int nLevel)
-{
-    const std::uint64_t nDown = nFull / nLevel;
-    return nLevel == 1 ? nReduced == nFull : nReduced != 0 && nReduced <= nDown + 1 && nReduced + 1 >= nDown;
-}
-
-} // namespace
 
 // By the editor's number, or for a file that is only read by its place; 0 for the image of such a file.
 std::uint64_t TifDataset::FindLevelPage(unsigned int nLevel, const Place& oPlace) const
@@ -92,7 +81,8 @@ bool TifDataset::SetEncodedForm(unsigned int nLevel, const krv::datasources::Enc
         Refuse("blocks are stored already", oPlace);
     oEditor.LoadTags(*poOld);
     const std::shared_ptr<PageModel> poNew = MakeEncodedPage(*poOld, oForm);
-    if (!poNew || !IsReduced(GetWidth(), oForm.mnWidth, nLevel) || !IsReduced(GetHeight(), oForm.mnHeight, nLevel))
+    if (!poNew || !krv::datasources::IsLevelSize(GetWidth(), oForm.mnWidth, nLevel) ||
+        !krv::datasources::IsLevelSize(GetHeight(), oForm.mnHeight, nLevel))
         return false;
     oEditor.LayOut(*poNew, oPlace);
     poNew->mnNumber = nNumber;

@@ -215,14 +215,25 @@ private:
         if (poBlocks == nullptr)
             return false;
         EncodedForm oForm = poBlocks->GetEncodedForm(nLevel);
-        oForm.mnWidth = nWidth;
-        oForm.mnHeight = nHeight;
-        if (!oForm.mbWholeBlocks)
+        const auto Cut = [](unsigned int nBlock, unsigned int nOld, unsigned int nNew)
         {
-            oForm.mnBlockWidth = nWidth;
-            oForm.mnBlockHeight = std::min(oForm.mnBlockHeight, nHeight);
-        }
-        return poBlocks->SetEncodedForm(nLevel, oForm);
+            return nBlock == nOld ? nNew : std::min(nBlock, nNew);
+        };
+        const auto Set = [&](bool bWhole)
+        {
+            EncodedForm oNew = oForm;
+            oNew.mbWholeBlocks = bWhole;
+            oNew.mnWidth = nWidth;
+            oNew.mnHeight = nHeight;
+            if (!bWhole)
+            {
+                oNew.mnBlockWidth = Cut(oForm.mnBlockWidth, oForm.mnWidth, nWidth);
+                oNew.mnBlockHeight = Cut(oForm.mnBlockHeight, oForm.mnHeight, nHeight);
+            }
+            return poBlocks->SetEncodedForm(nLevel, oNew);
+        };
+        // Of some formats all blocks are whole in one size of a level, and end with it in another.
+        return Set(oForm.mbWholeBlocks) || (oForm.mbWholeBlocks && Set(false));
     }
 
     // The channels of each type by themselves.
