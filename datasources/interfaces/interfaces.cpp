@@ -25,6 +25,7 @@
 #include "datasources/interfaces/isidecardataset.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/interfaces/iverifieddataset.h"
+#include "toolkit/core/numbertext.h"
 
 namespace krv::datasources
 {
@@ -63,6 +64,20 @@ unsigned int FindValidityMask(const IBitmapDataset& oBitmaps)
         if (oBitmaps.GetBitmapDescription(nBitmap).empty())
             return nBitmap;
     return 0;
+}
+
+std::map<unsigned int, unsigned int> FindChannelMasks(const IBitmapDataset& oBitmaps)
+{
+    std::map<unsigned int, unsigned int> oMasks;
+    for (const unsigned int nBitmap : oBitmaps.GetBitmapList())
+    {
+        const MetadataMap oTags = oBitmaps.GetBitmapMetadata(nBitmap);
+        const auto oFound = oTags.find(VALIDITY_OF_CHANNEL);
+        const auto oChannel = oFound == oTags.end() ? std::nullopt : ParseNumber<unsigned int>(oFound->second);
+        if (oChannel && !oBitmaps.GetBitmapDescription(nBitmap).empty())
+            oMasks.emplace(*oChannel, nBitmap);
+    }
+    return oMasks;
 }
 
 } // namespace krv::datasources

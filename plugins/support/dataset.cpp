@@ -4,6 +4,7 @@
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/raster/rasterinfo.h"
 #include "plugins/support/image/rasterio.h"
+#include "plugins/support/sidecar/sidecarfile.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 
@@ -50,7 +51,7 @@ void Dataset::Abandon() const noexcept
     try
     {
         const Place oPlace = Place::Current();
-        if (mpoWriter->HasUnsaved() && std::uncaught_exceptions() <= mnExceptions)
+        if ((mpoWriter->HasUnsaved() || (mpoSidecars && mpoSidecars->HoldsChanges())) && std::uncaught_exceptions() <= mnExceptions)
             krv::nspio::Warning::Warn(moName +
                                           ": the dataset goes without Synchronize or Close; what was written since "
                                           "the last one is lost",
@@ -130,8 +131,15 @@ krv::datasources::FileAccessState Dataset::Delete()
     if (mpoWriter)
         mpoWriter->Discard();
     Close();
-    if ((mpoWriter && !mpoWriter->IsNamed()) || std::remove(moName.c_str()) == 0)
+    if (mpoWriter && !mpoWriter->IsNamed())
         return krv::datasources::eDone;
+    const std::vector<std::string> oCompanions = ListCompanions(moName);
+    if (std::remove(moName.c_str()) == 0)
+    {
+        for (const std::string& companion : oCompanions)
+            std::remove(companion.c_str());
+        return krv::datasources::eDone;
+    }
     return errno == ENOENT ? krv::datasources::eNotFound : krv::datasources::eDenied;
 }
 
@@ -169,14 +177,25 @@ bool Dataset::IsLinked() const
 void Dataset::Synchronize()
 {
     CheckOpen();
-    if (mpoWriter)
-        mpoWriter->Synchronize();
+    if (!mpoWriter)
+        return;
+    if (mpoSidecars)
+        mpoSidecars->CheckStore();
+    mpoWriter->Synchronize();
+    if (mpoSidecars)
+        mpoSidecars->Store();
 }
 
 void Dataset::Close()
 {
     if (mpoWriter && !mpoWriter->IsEnded())
+    {
+        if (mpoSidecars)
+            mpoSidecars->CheckStore();
         mpoWriter->Finish();
+        if (mpoSidecars)
+            mpoSidecars->Store();
+    }
     mbOpen = false;
     mpoSidecars.reset();
     mpoImage.reset();

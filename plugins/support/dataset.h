@@ -39,7 +39,7 @@ public:
     Dataset& operator=(const Dataset&) = delete;
 
     krv::datasources::IFileFormat* GetFileFormat() const override { return mpoFormat; }
-    // Closes the dataset and removes the file.
+    // Closes the dataset and removes the file, with the levels, masks and tags beside it.
     krv::datasources::FileAccessState Delete() override;
     // A new file exists from Create on, though it has its name only after Synchronize.
     bool Exists() const override;
@@ -77,13 +77,16 @@ public:
     const std::string& GetFileName() const { return moName; }
     // Throws the DataException of a change to a file that is only read or has no image yet. pWhat: as for Refuse.
     void CheckWriting(const char* pWhat, const Place& oPlace) const;
+    // Whether the file is new or changed.
+    bool IsWritten() const { return mpoWriter != nullptr; }
+    // The files beside the file: a format asks them for what its own does not say, and changes of them are stored with
+    // the file's. Throws as GetImage.
+    Sidecars& GetSidecars() const;
 
 protected:
     // For the destructor of a dataset whose members the writer asks: warns when changes are lost, unless an exception
     // is on its way, which says more, and discards them.
     void Abandon() const noexcept;
-    // Whether the file is new or changed.
-    bool IsWritten() const { return mpoWriter != nullptr; }
     // Whether it lies under its own name.
     bool IsNamed() const { return !mpoWriter || mpoWriter->IsNamed(); }
     // Throws DataException unless the image of a new file is to be laid out, and can be. bEmpty: without channels too.
@@ -98,9 +101,7 @@ protected:
     // For further images of the dataset: levels, bitmaps.
     const std::shared_ptr<BlockCache>& GetCache() const { return mpoCache; }
     void CheckOpen(const Place& oPlace = Place::Current()) const;
-    // The files beside the file: a format asks them for what its own does not say. Throws as GetImage.
-    Sidecars& GetSidecars() const;
-    // What that is; nothing unless overridden.
+    // What is asked of the files beside; nothing unless overridden.
     virtual Sidecars::Needs GetNeeds() const { return {}; }
     // Throws the DataException of an operation that the format lacks. what: such as "channels cannot be deleted".
     [[noreturn]] void Refuse(const std::string& what, const Place& oPlace = Place::Current()) const;

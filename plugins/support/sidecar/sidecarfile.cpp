@@ -4,6 +4,8 @@
 #include "toolkit/core/lettercase.h"
 #include "toolkit/exceptions/exceptions.h"
 
+#include <algorithm>
+#include <array>
 #include <filesystem>
 #include <system_error>
 
@@ -13,16 +15,26 @@ namespace krv::plugins::support
 namespace
 {
 
+// The names that a file beside another one may have; some may be the same.
+std::array<std::string, 5> ListNames(const std::string& base, const std::string& ending)
+{
+    return {base + ending, base + ToLower(ending), base + ToUpper(ending), ToLower(base + ending),
+            ToUpper(base + ending)};
+}
+
+bool IsFile(const std::filesystem::path& oPath)
+{
+    std::error_code oNone;
+    return std::filesystem::is_regular_file(oPath, oNone);
+}
+
 std::string FindBeside(const std::filesystem::path& oFile, const std::string& base, const std::string& ending)
 {
-    const std::string names[] = {base + ending, base + ToLower(ending), base + ToUpper(ending), ToLower(base + ending),
-                                 ToUpper(base + ending)};
     std::string tried;
-    for (const std::string& name : names)
+    for (const std::string& name : ListNames(base, ending))
     {
         const std::filesystem::path oSidecar = oFile.parent_path() / name;
-        std::error_code oNone;
-        if (name != tried && std::filesystem::is_regular_file(oSidecar, oNone))
+        if (name != tried && IsFile(oSidecar))
             return oSidecar.string();
         tried = name;
     }
@@ -41,6 +53,24 @@ std::string FindAppended(const std::string& fileName, const std::string& ending)
 {
     const std::filesystem::path oFile(fileName);
     return FindBeside(oFile, oFile.filename().string(), ending);
+}
+
+std::vector<std::string> ListCompanions(const std::string& fileName)
+{
+    const std::filesystem::path oFile(fileName);
+    const std::string base = oFile.filename().string();
+    std::vector<std::string> oFound;
+    for (const std::string ending : {LEVELS_ENDING, MASK_ENDING, AUX_XML_ENDING})
+        for (const std::string& name : ListNames(base, ending))
+        {
+            const std::filesystem::path oSidecar = oFile.parent_path() / name;
+            const std::string other = name.substr(0, base.size());
+            const bool bOther = other != base && IsFile(oFile.parent_path() / other);
+            if (!bOther && IsFile(oSidecar) &&
+                std::find(oFound.begin(), oFound.end(), oSidecar.string()) == oFound.end())
+                oFound.push_back(oSidecar.string());
+        }
+    return oFound;
 }
 
 std::string ReadSidecar(const std::string& sidecar, std::size_t nMaximum)

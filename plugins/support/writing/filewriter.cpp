@@ -1,5 +1,7 @@
 #include "plugins/support/writing/filewriter.h"
 
+#include "plugins/support/sidecar/sidecarfile.h"
+#include "plugins/support/writing/setaside.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <utility>
@@ -52,8 +54,15 @@ void FileWriter::Synchronize()
 
 void FileWriter::GiveName()
 {
-    mpoNew->TakeName(mbReplaces);
+    TakeName(*mpoNew);
     SetNamed();
+}
+
+void FileWriter::TakeName(NewFile& oNew) const
+{
+    SetAside oOld(mbNamed ? std::vector<std::string>() : ListCompanions(moFileName));
+    oNew.TakeName(TakesPlace());
+    oOld.Drop();
 }
 
 void FileWriter::Finish()
