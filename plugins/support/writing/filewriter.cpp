@@ -6,6 +6,8 @@
 
 #include <utility>
 
+#include <sys/stat.h>
+
 namespace krv::plugins::support
 {
 
@@ -60,7 +62,9 @@ void FileWriter::GiveName()
 
 void FileWriter::TakeName(NewFile& oNew) const
 {
-    SetAside oOld(mbNamed ? std::vector<std::string>() : ListCompanions(moFileName));
+    struct stat oStatus = {};
+    const bool bTaken = !TakesPlace() && ::lstat(moFileName.c_str(), &oStatus) == 0; // which is told below
+    SetAside oOld(mbNamed || bTaken ? std::vector<std::string>() : ListCompanions(moFileName));
     oNew.TakeName(TakesPlace());
     oOld.Drop();
 }

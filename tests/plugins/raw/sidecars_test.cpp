@@ -124,7 +124,7 @@ TEST(AuxXmlFiles, AreMerged)
 
 TEST(Sidecars, AddWhatTheFileLacks)
 {
-    for (const char* pFormat : {"TIF", "RAW"})
+    for (const char* pFormat : {"TIF", "RAW", "JP2", "DEMO"})
     {
         SCOPED_TRACE(pFormat);
         const TempFolder oFolder;
