@@ -55,6 +55,7 @@ IPagedDataset::~IPagedDataset() = default;
 IRasterDataset::~IRasterDataset() = default;
 IRasterIO::~IRasterIO() = default;
 ISidecarDataset::~ISidecarDataset() = default;
+ISidecarWriting::~ISidecarWriting() = default;
 IStorageDataset::~IStorageDataset() = default;
 IVerifiedDataset::~IVerifiedDataset() = default;
 

@@ -27,7 +27,8 @@ namespace krv::plugins::support
 class Dataset : public krv::datasources::IDataset,
                 public krv::datasources::IRasterDataset,
                 public krv::datasources::INewFileDataset,
-                public krv::datasources::ISidecarDataset
+                public krv::datasources::ISidecarDataset,
+                public krv::datasources::ISidecarWriting
 {
 public:
     // poFormat: the builder's, kept as a pointer. Operations that need the image throw DataException until SetImage.
@@ -72,11 +73,18 @@ public:
 
     // Nothing before there is an image.
     std::vector<krv::datasources::Sidecar> ListSidecars() override;
+    void BeginSidecars() override;
+    void WriteTagsBeside(const krv::datasources::AuxiliaryData& oData) override;
+    void WriteCRSBeside(const krv::ogc::cs::ICRS& oCRS) override;
+    void WriteGeocodingBeside(const krv::ogc::cs::GeocodingInfo& oInfo) override;
 
     // For what stands on the dataset.
     const std::string& GetFileName() const { return moName; }
     // Throws the DataException of a change to a file that is only read or has no image yet. pWhat: as for Refuse.
     void CheckWriting(const char* pWhat, const Place& oPlace) const;
+    // The same for what lies beside the file.
+    void CheckWritingBeside(const char* pWhat, const Place& oPlace) const;
+    bool WritesBeside() const { return IsWritten() || mbSidecarsWritten; }
     // Whether the file is new or changed.
     bool IsWritten() const { return mpoWriter != nullptr; }
     // The files beside the file: a format asks them for what its own does not say, and changes of them are stored with
@@ -107,12 +115,17 @@ protected:
     [[noreturn]] void Refuse(const std::string& what, const Place& oPlace = Place::Current()) const;
 
 private:
+    void Store(bool bLast);
+    // Throws the DataException that the file itself says something, unless it does not.
+    void CheckLacking(bool bLacking, const char* pWhat, const Place& oPlace) const;
+
     std::string moName;
     krv::datasources::IFileFormat* mpoFormat;
     std::shared_ptr<BlockCache> mpoCache;
     std::shared_ptr<BlockImage> mpoImage;
     mutable std::unique_ptr<Sidecars> mpoSidecars;
     std::shared_ptr<FileWriter> mpoWriter; // null when the file is only read
+    bool mbSidecarsWritten = false;
     bool mbOpen = true;
     int mnExceptions = std::uncaught_exceptions();
 };

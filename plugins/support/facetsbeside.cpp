@@ -33,7 +33,7 @@ krv::datasources::IRasterIO* FacetsBeside::GetBitmapIO(const std::vector<unsigne
 {
     std::vector<std::unique_ptr<krv::datasources::IRasterIO>> oParts;
     for (const unsigned int nBitmap : oBitmaps)
-        oParts.emplace_back(FindMask(nBitmap).OpenMask(nBitmap, moDataset.IsWritten()));
+        oParts.emplace_back(FindMask(nBitmap).OpenMask(nBitmap, moDataset.WritesBeside()));
     if (oParts.size() == 1)
         return oParts.front().release();
     return new StackedIO(std::move(oParts), 1, 1);
@@ -41,14 +41,14 @@ krv::datasources::IRasterIO* FacetsBeside::GetBitmapIO(const std::vector<unsigne
 
 void FacetsBeside::DeleteBitmap(unsigned int nBitmap)
 {
-    moDataset.CheckWriting("bitmaps cannot be deleted", Place::Current());
+    moDataset.CheckWritingBeside("bitmaps cannot be deleted", Place::Current());
     FindMask(nBitmap).DropMasks();
 }
 
 unsigned int FacetsBeside::CreateBitmap()
 {
     const Place oPlace = Place::Current();
-    moDataset.CheckWriting("bitmaps cannot be added", oPlace);
+    moDataset.CheckWritingBeside("bitmaps cannot be added", oPlace);
     if (!moDataset.GetSidecars().ListMasks().empty())
         RefuseBeside("validity masks lie beside the file already, and there is no place for other bitmaps", oPlace);
     moDataset.GetSidecars().MakeMask();
@@ -64,7 +64,7 @@ std::string FacetsBeside::GetBitmapDescription(unsigned int nBitmap) const
 void FacetsBeside::SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription)
 {
     const Place oPlace = Place::Current();
-    moDataset.CheckWriting("bitmaps cannot be written", oPlace);
+    moDataset.CheckWritingBeside("bitmaps cannot be written", oPlace);
     Sidecars& oSidecars = FindMask(nBitmap, oPlace);
     if (oDescription == oSidecars.DescribeMask(nBitmap))
         return;
@@ -103,7 +103,7 @@ krv::mathmodel::IMathModel* FacetsBeside::GetMathModel(unsigned int nSegment)
 unsigned int FacetsBeside::CreateMathModel(const krv::mathmodel::IMathModel& oModel)
 {
     const Place oPlace = Place::Current();
-    moDataset.CheckWriting("sensor models cannot be written", oPlace);
+    moDataset.CheckWritingBeside("sensor models cannot be written", oPlace);
     const auto* const poPolynomials = dynamic_cast<const krv::mathmodel::RpcModel*>(&oModel);
     if (poPolynomials == nullptr)
         RefuseBeside("a sensor model of the kind " + oModel.GetName() + " cannot be written", oPlace);
