@@ -252,9 +252,8 @@ std::unique_ptr<Mask> ValiditySource::CombineChannels(const Raster& oRaster) con
     std::unique_ptr<Mask> poAll;
     for (const Channel& oChannel : moChannels)
     {
-        std::unique_ptr<Mask> poOne(oChannel.mpoNoData != nullptr
-                                        ? oChannel.mpoNoData->BuildMask(oRaster)
-                                        : new Mask(oRaster.GetInfo(), oRaster.GetContext()));
+        std::unique_ptr<Mask> poOne(oChannel.mpoNoData != nullptr ? oChannel.mpoNoData->BuildMask(oRaster)
+                                                                  : new Mask(oRaster.GetInfo(), oRaster.GetContext()));
         if (oChannel.mpoMask != nullptr)
             Add(*poOne, *std::unique_ptr<Mask>(oChannel.mpoMask->BuildMask(oRaster)));
         if (poAll == nullptr)

@@ -64,8 +64,8 @@ public:
     bool HasAlpha() const { return mpoAlpha != nullptr || mnAlphaInRaster != 0; }
     // The number of the image's mask bitmap; 0 when there is none.
     unsigned int GetBitmap() const { return mnBitmap; }
-    // What marks the pixels that the mask of a channel alone says to be background, by its position in the rasters, from
-    // 0; null when it has no mask. It goes with this.
+    // What marks the pixels that the mask of a channel alone says to be background, by its position in the rasters,
+    // from 0; null when it has no mask. It goes with this.
     const krv::gobs::IMaskBuilder* GetChannelMask(std::size_t nPosition) const;
 
     // How the margins of the rasters were made; eMirror when nobody says. Behaviours that copy pixels copy their

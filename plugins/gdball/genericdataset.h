@@ -74,7 +74,8 @@ private:
 };
 
 // A dataset over it: what the image has, with the levels beside it in place of its own, and with what else can be kept
-// beside it where its file cannot be changed. A change of its pixels makes the levels outdated. The last of several that goes, or is closed, closes the files.
+// beside it where its file cannot be changed. A change of its pixels makes the levels outdated. The last of several
+// that goes, or is closed, closes the files.
 class GenericDataset : public krv::datasources::IDataset,
                        public krv::datasources::IRasterDataset,
                        public krv::datasources::IGeocodedDataset,

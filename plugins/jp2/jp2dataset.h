@@ -92,7 +92,7 @@ private:
     std::map<unsigned int, std::shared_ptr<support::BlockImage>> moLevels; // that are open
     krv::datasources::AuxiliaryData moBook;                                // empty: no level is invalid
     mutable std::unique_ptr<GeoPlace> mpoPlace;                            // looked for when it is asked for
-    mutable std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding; // the file's or that of a file beside it
+    mutable std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding;        // the file's or that of a file beside it
     mutable std::set<std::string> moComplaints;
 };
 

@@ -154,8 +154,9 @@ unsigned int KrvdskDataset::FindBeside(unsigned int nBitmap) const
     if (nMask == 0 || !GetSidecars().HasMask(nMask))
         return 0;
     const std::vector<unsigned int> oInside = ListInside();
-    const bool bBeside = std::none_of(oInside.begin(), oInside.end(), [&](unsigned int nOne)
-                                      { return nOne == nBitmap || DescribeInside(nOne).empty(); });
+    const bool bBeside =
+        std::none_of(oInside.begin(), oInside.end(),
+                     [&](unsigned int nOne) { return nOne == nBitmap || DescribeInside(nOne).empty(); });
     return bBeside ? nMask : 0;
 }
 

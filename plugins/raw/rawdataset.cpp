@@ -48,13 +48,15 @@ void RawOptions::List(support::Options& oOptions)
 }
 
 RawDataset::RawDataset(RawFiles oFiles, krv::datasources::IFileFormat* poFormat)
-    : Dataset(oFiles.moData.empty() ? oFiles.moHeader : oFiles.moData, poFormat), FacetsBeside(this), moImage(ReadWhole(std::move(oFiles)))
+    : Dataset(oFiles.moData.empty() ? oFiles.moHeader : oFiles.moData, poFormat), FacetsBeside(this),
+      moImage(ReadWhole(std::move(oFiles)))
 {
     ShowImage(std::make_shared<support::File>(moImage.moFiles.moData, support::File::Mode::eRead));
 }
 
 RawDataset::RawDataset(krv::datasources::IFileFormat* poFormat, RawFiles oFiles, std::shared_ptr<RawWriter> poWriter)
-    : Dataset(poFormat, poWriter), FacetsBeside(this), moImage(ReadWhole(std::move(oFiles))), mpoWriter(std::move(poWriter))
+    : Dataset(poFormat, poWriter), FacetsBeside(this), moImage(ReadWhole(std::move(oFiles))),
+      mpoWriter(std::move(poWriter))
 {
     ShowImage(mpoWriter->GetFile());
 }

@@ -51,8 +51,7 @@ void Dataset::Abandon() const noexcept
     try
     {
         const Place oPlace = Place::Current();
-        const bool bUnsaved =
-            (mpoWriter && mpoWriter->HasUnsaved()) || (mpoSidecars && mpoSidecars->HoldsChanges());
+        const bool bUnsaved = (mpoWriter && mpoWriter->HasUnsaved()) || (mpoSidecars && mpoSidecars->HoldsChanges());
         if (bUnsaved && std::uncaught_exceptions() <= mnExceptions)
             krv::nspio::Warning::Warn(moName +
                                           ": the dataset goes without Synchronize or Close; what was written since "
@@ -172,8 +171,7 @@ void Dataset::WriteTagsBeside(const krv::datasources::AuxiliaryData& oData)
         }
         return oNew;
     };
-    oTags.SetFileMetadata(
-        TakeOwn(oShown.GetFileMetadata(), oBeside.GetFileMetadata(), oData.GetFileMetadata()));
+    oTags.SetFileMetadata(TakeOwn(oShown.GetFileMetadata(), oBeside.GetFileMetadata(), oData.GetFileMetadata()));
     for (unsigned int nChannel = 1; nChannel <= GetChanCount(); ++nChannel)
     {
         oTags.SetChanMetadata(TakeOwn(oShown.GetChanMetadata(nChannel), oBeside.GetChanMetadata(nChannel),

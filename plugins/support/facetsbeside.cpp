@@ -72,7 +72,8 @@ void FacetsBeside::SetBitmapDescription(unsigned int nBitmap, const std::string&
     {
         if (oSidecars.IsZone())
             oSidecars.DropMasks();
-        RefuseBeside("a zone cannot be kept beside the file: a bitmap without a description, the validity mask, can", oPlace);
+        RefuseBeside("a zone cannot be kept beside the file: a bitmap without a description, the validity mask, can",
+                     oPlace);
     }
     if (!oSidecars.IsZone())
         RefuseBeside("the mask of a channel cannot become the one of the image", oPlace);

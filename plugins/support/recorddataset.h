@@ -65,7 +65,7 @@ private:
     mutable bool mbForgotten = false; // what was known of the pixels before the last change
     bool mbForgottenNamed = false;    // while the file had its name
     mutable std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding; // the record's or that of a file beside
-    std::map<unsigned int, std::shared_ptr<BlockImage>> moOpened; // levels
+    std::map<unsigned int, std::shared_ptr<BlockImage>> moOpened;   // levels
 };
 
 } // namespace krv::plugins::support
