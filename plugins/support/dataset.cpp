@@ -1,6 +1,7 @@
 #include "plugins/support/dataset.h"
 
 #include "datasources/interfaces/channelinfo.h"
+#include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/raster/rasterinfo.h"
 #include "plugins/support/image/rasterio.h"
@@ -132,7 +133,10 @@ std::vector<krv::datasources::Sidecar> Dataset::ListSidecars()
 {
     if (!HasImage())
         return {};
-    return GetSidecars().List(GetNeeds());
+    Sidecars::Needs oNeeds = GetNeeds();
+    const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(GetOverviewManager());
+    oNeeds.mbLevels = poLevels == nullptr || poLevels->GetLevels().empty();
+    return GetSidecars().List(oNeeds);
 }
 
 void Dataset::BeginSidecars()

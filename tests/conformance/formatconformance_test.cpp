@@ -8,6 +8,7 @@
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/interfaces/isidecardataset.h"
 #include "datasources/iomanager/datasetmanager.h"
+#include "datasources/iomanager/formatcapabilities.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/validitysource.h"
@@ -231,6 +232,41 @@ TEST_P(FormatConformance, BitmapsReadTheSameBeforeAndAfterTheyAreStored)
         poDataset.reset(DatasetManager::GetInstance()->Open(file, eReadOnly));
         poBitmaps = &dynamic_cast<IBitmapDataset&>(*poDataset);
         EXPECT_TRUE(Read() == expected) << "opened again";
+    }
+}
+
+// What a file cannot hold becomes the nearest value that it can, at once.
+TEST_P(FormatConformance, NarrowSamplesReadTheSameBeforeAndAfterTheyAreStored)
+{
+    const auto& oCan = DatasetManager::GetInstance()->GetCapabilities(GetParam().moShortName);
+    if (!oCan.IsSupported(CAPABILITY_NARROW_SAMPLES))
+        GTEST_SKIP() << "no narrow samples";
+    for (const auto& [eType, pBits] : {std::pair{krv::gobs::eDT_8U, "4"},
+                                       {krv::gobs::eDT_8S, "5"},
+                                       {krv::gobs::eDT_16U, "12"},
+                                       {krv::gobs::eDT_16S, "9"},
+                                       {krv::gobs::eDT_32R, "16"},
+                                       {krv::gobs::eDT_32R, "24"}})
+    {
+        SCOPED_TRACE(std::string("NBITS=") + pBits);
+        const DataType oType(eType);
+        if (oType.IsReal() && GetParam().moShortName != "TIF")
+            continue;
+        const std::string file = moFolder.File("narrow");
+        std::unique_ptr<IDataset> poDataset(DatasetManager::GetInstance()->NewDataset(
+            file, GetParam().moShortName, "BLOCKXSIZE=64 BLOCKYSIZE=64 NBITS=" + std::string(pBits)));
+        dynamic_cast<IRasterDataset&>(*poDataset).Create(300, 133, {oType, oType});
+        std::string part = RecipeImage(50, 40, {1, 2}, oType);
+        std::unique_ptr<IRasterIO> poIO(dynamic_cast<IRasterDataset&>(*poDataset).GetRasterIO({1, 2}));
+        poIO->WriteWindow(33u, 21u, 50u, 40u, reinterpret_cast<unsigned char*>(part.data()));
+        std::string held(part.size(), '?');
+        poIO->ReadWindow(33u, 21u, 50u, 40u, reinterpret_cast<unsigned char*>(held.data()));
+        EXPECT_FALSE(held == part) << "the recipe has values that do not fit";
+        poIO.reset();
+        poDataset->Close();
+        BasicReader oReader(file);
+        const std::unique_ptr<krv::gobs::Raster> poStored(oReader.ReadRaster(33, 21, 50, 40));
+        EXPECT_TRUE(std::string(reinterpret_cast<char*>(poStored->GetBuffer()), held.size()) == held);
     }
 }
 

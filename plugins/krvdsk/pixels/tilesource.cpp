@@ -67,8 +67,7 @@ std::unique_ptr<TileSource::Work> TileSource::MakeWork(std::size_t nPlane)
     return std::unique_ptr<Work>(
         new Work{poPlane, poPlane->moTables.at(moOrigin.mnLevel), TileCodec(*poPlane),
                  support::HeldBlocks(ChooseBound(moLayout, nPixelBytes), nPixelBytes, StoreBlock,
-                                     poPlane->moType.GetBits() < 8 ? support::HeldBlocks::Samples::eBits
-                                                                   : support::HeldBlocks::Samples::eValues)});
+                                     poPlane->moType.GetBits() < 8 ? &support::HeldBlocks::SettleBits : nullptr)});
 }
 
 TileSource::Spot TileSource::GetSpot(const support::BlockAddress& oBlock) const

@@ -103,6 +103,13 @@ private:
     std::function<void()> moChange;
 };
 
+// The generic format says why not.
+bool HasUsableLevels(const std::string& fileName)
+{
+    auto* const poManager = krv::datasources::DatasetManager::GetInstance();
+    return std::unique_ptr<krv::datasources::IDataset>(poManager->OpenFormat("GDBALL", fileName, eReadOnly)) != nullptr;
+}
+
 void AddMissing(const MetadataMap& oFrom, MetadataMap& oTo, bool bNoData)
 {
     for (const auto& [key, value] : oFrom)
@@ -462,7 +469,10 @@ std::vector<krv::datasources::Sidecar> Sidecars::List(const Needs& oNeeds)
     Add(*moMaskName, "mask", oNeeds.mbMask && !moMasks.empty(), true);
     for (const char* const pEnding : {"_RPC.TXT", ".rpb"})
         Add(FindSidecar(moFileName, pEnding), "sensor model", oNeeds.mbTags, false);
-    Add(FindAppended(moFileName, LEVELS_ENDING), "levels", true, true);
+    const std::string levels = FindAppended(moFileName, LEVELS_ENDING);
+    if (!levels.empty() && !HasUsableLevels(moFileName))
+        moTroubles.emplace(levels, "it holds no levels of the image");
+    Add(levels, "levels", oNeeds.mbLevels, true);
     return oList;
 }
 

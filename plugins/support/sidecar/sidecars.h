@@ -78,13 +78,14 @@ public:
     void Store();
 
     // All that lie beside the file, each with what came of it, those included that nobody asked for. oNeeds: whether
-    // the file's own says nothing of the geocoding, of the system and of validity.
+    // the file's own says nothing of the geocoding, of the system, of validity, and has no levels.
     struct Needs
     {
         bool mbTags = false; // the format adds tags and sensor models
         bool mbGeocoding = false;
         bool mbCRS = false;
         bool mbMask = false;
+        bool mbLevels = false;
     };
     std::vector<krv::datasources::Sidecar> List(const Needs& oNeeds);
 
