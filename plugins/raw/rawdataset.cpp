@@ -83,7 +83,7 @@ void RawDataset::ShowImage(std::shared_ptr<support::File> poFile)
     const auto BeforeWrite = [this]
     {
         mpoWriter->BeginChange();
-        GetSidecars().ForgetPixels();
+        ForgetPixelsBeside();
     };
     mpoSource =
         std::make_shared<support::PlainSource>(std::move(poFile), oForm.PlacePlanes(), oForm.IsSwapped(),

@@ -65,6 +65,7 @@ void Dataset::Abandon() const noexcept
     }
     if (mpoWriter)
         mpoWriter->Discard();
+    mpoSidecars.reset();
 }
 
 void Dataset::CheckWritingBeside(const char* pWhat, const Place& oPlace) const
@@ -139,6 +140,12 @@ std::vector<krv::datasources::Sidecar> Dataset::ListSidecars()
     return GetSidecars().List(oNeeds);
 }
 
+void Dataset::ForgetPixelsBeside()
+{
+    if (IsNamed())
+        GetSidecars().ForgetPixels();
+}
+
 void Dataset::BeginSidecars()
 {
     GetSidecars();
@@ -158,7 +165,11 @@ void Dataset::WriteTagsBeside(const krv::datasources::AuxiliaryData& oData)
     using krv::datasources::MetadataMap;
     const Place oPlace = Place::Current();
     constexpr const char* WHAT = "metadata cannot be written";
-    CheckLacking(oData.GetChannelCount() == GetChanCount(), WHAT, oPlace);
+    CheckLacking(true, WHAT, oPlace);
+    if (oData.GetChannelCount() != GetChanCount())
+        Refuse("the metadata are those of " + std::to_string(oData.GetChannelCount()) + " channels, not of " +
+                   std::to_string(GetChanCount()),
+               oPlace);
     const krv::datasources::AuxiliaryData oShown = ReadAuxiliaryData();
     AuxXml oAuxXml = GetSidecars().GetAuxXml();
     krv::datasources::AuxiliaryData oTags = oData, oBeside = oAuxXml.GetTags();

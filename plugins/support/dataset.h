@@ -109,6 +109,9 @@ protected:
     // For further images of the dataset: levels, bitmaps.
     const std::shared_ptr<BlockCache>& GetCache() const { return mpoCache; }
     void CheckOpen(const Place& oPlace = Place::Current()) const;
+    // For the format to call before pixels of the image change: what lies beside says nothing of their values any more.
+    // The record of a file that has no name yet is that of the pixels to come.
+    void ForgetPixelsBeside();
     // What is asked of the files beside; nothing unless overridden.
     virtual Sidecars::Needs GetNeeds() const { return {}; }
     // Throws the DataException of an operation that the format lacks. what: such as "channels cannot be deleted".

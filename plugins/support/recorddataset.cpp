@@ -107,7 +107,7 @@ void RecordDataset::ForgetOldPixels()
 {
     if (mbForgotten && (!IsNamed() || mbForgottenNamed))
         return;
-    GetSidecars().ForgetPixels();
+    ForgetPixelsBeside();
     RecordText oRecord = moRecord;
     bool bNews = IsNamed() && krv::datasources::DropStatistics(oRecord.moTags);
     for (const auto& [nLevel, nPlace] : moRecord.moLevels)

@@ -103,6 +103,20 @@ private:
     std::function<void()> moChange;
 };
 
+// One that cannot be changed is read, and refuses changes itself.
+std::unique_ptr<krv::datasources::IDataset> OpenForUpdate(const std::string& fileName)
+{
+    auto* const poManager = krv::datasources::DatasetManager::GetInstance();
+    try
+    {
+        return std::unique_ptr<krv::datasources::IDataset>(poManager->Open(fileName, eUpdate));
+    }
+    catch (const Exception&)
+    {
+        return std::unique_ptr<krv::datasources::IDataset>(poManager->Open(fileName, eReadOnly));
+    }
+}
+
 // The generic format says why not.
 bool HasUsableLevels(const std::string& fileName)
 {
@@ -314,7 +328,7 @@ krv::datasources::IRasterIO* Sidecars::OpenMask(unsigned int nMask, bool bWrite)
     if (bWrite && !mbMaskWritten)
     {
         mpoMask.reset();
-        mpoMask.reset(krv::datasources::DatasetManager::GetInstance()->Open(*moMaskName, eUpdate));
+        mpoMask = OpenForUpdate(*moMaskName);
         mbMaskWritten = true;
     }
     const auto Change = [this]
@@ -379,6 +393,13 @@ krv::mathmodel::RpcCoefficients Sidecars::ReadModel(unsigned int nModel) const
 void Sidecars::SetAuxXml(AuxXml oAuxXml)
 {
     LoadAuxXml();
+    if (const auto oTrouble = moTroubles.find(moAuxXmlName); oTrouble != moTroubles.end())
+    {
+        if (oAuxXml.IsEmpty())
+            return;
+        throw DataException(moAuxXmlName + " is not replaced, since it cannot be used: " + oTrouble->second +
+                            "; remove it first");
+    }
     moAuxXml = std::move(oAuxXml);
     mbAuxXmlChanged = true;
     mbForgotten = false;
@@ -389,7 +410,8 @@ void Sidecars::ForgetPixels()
     if (mbForgotten)
         return;
     AuxXml oAuxXml = LoadAuxXml();
-    if (oAuxXml.DropStatistics())
+    const bool bCurrent = oAuxXml.GetStamp() && oAuxXml.GetStamp() == FindStamp(moFileName);
+    if (oAuxXml.DropStatistics() || bCurrent)
         SetAuxXml(std::move(oAuxXml));
     mbForgotten = true;
 }

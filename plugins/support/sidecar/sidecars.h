@@ -66,10 +66,11 @@ public:
     unsigned int SetModel(const krv::mathmodel::RpcCoefficients& oModel);
 
     // What ".aux.xml" says; what is set counts at once, and Store replaces the file as a whole, or removes one that
-    // says nothing.
+    // says nothing. Setting throws DataException where there is a file that cannot be used, which would be lost.
     const AuxXml& GetAuxXml() { return LoadAuxXml(); }
     void SetAuxXml(AuxXml oAuxXml);
-    // Before pixels change: what ".aux.xml" says of their values goes. Costs nothing the second time.
+    // Before pixels change: what ".aux.xml" says of their values goes, and it is still of this file afterwards. Costs
+    // nothing the second time.
     void ForgetPixels();
 
     // Throws DataException for what Store cannot keep.
