@@ -375,6 +375,27 @@ void AskPlugin(const std::string& file, const LoadedPlugin& oPlugin, const Heade
 
 } // namespace
 
+std::string DescribeUnknown(const std::string& file)
+{
+    Header oHeader{};
+    const std::string kind = GuessFileKind(oHeader.data(), ReadHeader(file, oHeader));
+    if (!kind.empty())
+        return "it begins like " + kind;
+    const std::filesystem::path oPath(file);
+    for (const std::string& header :
+         {file + ".rsc", file + ".par", oPath.parent_path() / (oPath.stem().string() + ".par"),
+          oPath.parent_path() / (oPath.stem().string() + "_dem.par")})
+    {
+        std::error_code oNone;
+        if (std::filesystem::is_regular_file(header, oNone))
+            return fmt::format(
+                "the header {} beside it is of a kind that is not read: write an ENVI header {}.hdr with "
+                "its size and data type",
+                header, file);
+    }
+    return {};
+}
+
 std::vector<Finding> CheckFile(const std::string& file, const std::vector<LoadedPlugin>& oPlugins)
 {
     const std::string why = WhyUnreadable(file);
@@ -393,7 +414,9 @@ std::vector<Finding> CheckFile(const std::string& file, const std::vector<Loaded
     bool bRecognised = false;
     for (const LoadedPlugin& oPlugin : oPlugins)
         AskPlugin(file, oPlugin, oHeader, bRecognised, oFindings);
-    if (!bRecognised)
+    if (const std::string kind = bRecognised ? std::string() : DescribeUnknown(file); !kind.empty())
+        oFindings.push_back({false, "file " + file, "no format recognises it: " + kind, {}});
+    else if (!bRecognised)
         oFindings.push_back({false, "file " + file, "no format recognises it",
                              "install the plug-in of its format, or convert it to one that `krv formats` lists"});
     return oFindings;

@@ -126,9 +126,38 @@ std::shared_ptr<support::BlockImage> KrvdskDataset::OpenBitmap(unsigned int nBit
     return poImage;
 }
 
-std::vector<unsigned int> KrvdskDataset::GetBitmapList() const
+std::vector<unsigned int> KrvdskDataset::ListInside() const
 {
     return ListWithLinked(Segment::BITMAP, &krv::datasources::IBitmapDataset::GetBitmapList);
+}
+
+std::string KrvdskDataset::DescribeInside(unsigned int nBitmap) const
+{
+    if (const auto* const poTheirs = FindLinkedBitmap(nBitmap))
+        return poTheirs->GetBitmapDescription(nBitmap);
+    return GetSegment(Segment::BITMAP, nBitmap, Place::Current()).moDescription;
+}
+
+std::vector<unsigned int> KrvdskDataset::GetBitmapList() const
+{
+    std::vector<unsigned int> oList = ListInside();
+    if (std::none_of(oList.begin(), oList.end(),
+                     [this](unsigned int nBitmap) { return DescribeInside(nBitmap).empty(); }))
+        for (const unsigned int nMask : GetSidecars().ListMasks())
+            oList.push_back(support::FIRST_BESIDE + nMask);
+    return oList;
+}
+
+unsigned int KrvdskDataset::FindBeside(unsigned int nBitmap) const
+{
+    const unsigned int nMask = nBitmap > support::FIRST_BESIDE ? nBitmap - support::FIRST_BESIDE : 0;
+    if (nMask == 0 || !GetSidecars().HasMask(nMask))
+        return 0;
+    const std::vector<unsigned int> oInside = ListInside();
+    const bool bBeside =
+        std::none_of(oInside.begin(), oInside.end(),
+                     [&](unsigned int nOne) { return nOne == nBitmap || DescribeInside(nOne).empty(); });
+    return bBeside ? nMask : 0;
 }
 
 krv::datasources::IRasterIO* KrvdskDataset::GetBitmapIO(const std::vector<unsigned int>& oBitmaps)
@@ -136,6 +165,11 @@ krv::datasources::IRasterIO* KrvdskDataset::GetBitmapIO(const std::vector<unsign
     std::vector<std::unique_ptr<krv::datasources::IRasterIO>> oParts;
     for (const unsigned int nBitmap : oBitmaps)
     {
+        if (const unsigned int nBeside = FindBeside(nBitmap))
+        {
+            oParts.emplace_back(GetSidecars().OpenMask(nBeside, false));
+            continue;
+        }
         if (auto* const poTheirs = FindLinkedBitmap(nBitmap))
         {
             oParts.push_back(std::make_unique<LinkedIO>(mpoLink, LinkedIO::Size{GetWidth(), GetHeight()},
@@ -185,9 +219,8 @@ void KrvdskDataset::DeleteBitmap(unsigned int nBitmap)
 
 std::string KrvdskDataset::GetBitmapDescription(unsigned int nBitmap) const
 {
-    if (const auto* const poTheirs = FindLinkedBitmap(nBitmap))
-        return poTheirs->GetBitmapDescription(nBitmap);
-    return GetSegment(Segment::BITMAP, nBitmap, Place::Current()).moDescription;
+    const unsigned int nBeside = FindBeside(nBitmap);
+    return nBeside != 0 ? GetSidecars().DescribeMask(nBeside) : DescribeInside(nBitmap);
 }
 
 void KrvdskDataset::SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription)
@@ -198,6 +231,8 @@ void KrvdskDataset::SetBitmapDescription(unsigned int nBitmap, const std::string
 // What it says of its levels is kept by their manager.
 krv::datasources::MetadataMap KrvdskDataset::GetBitmapMetadata(unsigned int nBitmap) const
 {
+    if (const unsigned int nBeside = FindBeside(nBitmap))
+        return GetSidecars().GetMaskTags(nBeside);
     if (const auto* const poTheirs = FindLinkedBitmap(nBitmap))
         return poTheirs->GetBitmapMetadata(nBitmap);
     krv::datasources::AuxiliaryData oBook(1);

@@ -141,6 +141,13 @@ private:
     };
 
     const Catalogue& GetCatalogue() const { return mpoWriter ? mpoWriter->GetCatalogue() : moCatalogue; }
+    // The bitmaps of the file and of the linked one, and what one of them is called.
+    std::vector<unsigned int> ListInside() const;
+    std::string DescribeInside(unsigned int nBitmap) const;
+    // The mask beside the file that a bitmap is, which there is where those inside do not say it; else 0.
+    unsigned int FindBeside(unsigned int nBitmap) const;
+    // The model beside it that a segment is, where there are no others; else 0.
+    unsigned int FindModelBeside(unsigned int nSegment) const;
     // Of a file that is changed; throws DataException for any other.
     StoreWriter& GetWriter(const char* pWhat, const Place& oPlace) const;
     void ShowFile();

@@ -120,9 +120,6 @@ protected:
 private:
     class Levels;
 
-    // The number of a mask that lies beside the file, shown where the file has no validity mask of its own.
-    static constexpr unsigned int MASK_BESIDE = 65536;
-
     // The other pages by what they are to the first one.
     struct PageTable
     {
@@ -156,7 +153,8 @@ private:
     Page& GetPage(const Place& oPlace = Place::Current()) const;
     const PageTable& GetPages() const;
     bool HasOwnMask() const;
-    bool IsBeside(unsigned int nBitmap) const { return nBitmap == MASK_BESIDE && !HasOwnMask(); }
+    // The mask beside the file that a bitmap is, which there is where the file has no validity mask of its own; else 0.
+    unsigned int FindBeside(unsigned int nBitmap) const;
     const PageSummary& GetMask(unsigned int nBitmap, const Place& oPlace) const;
     void CheckPCT(unsigned int nPCT, const Place& oPlace) const;
     krv::datasources::AuxiliaryData ReadRecord() const;

@@ -1,6 +1,7 @@
 #include "tools/krv/errors.h"
 
 #include "datasources/formatregistrar/winformatregistrar.h"
+#include "operations/diagnosis/diagnosis.h"
 #include "operations/source/sourcefile.h"
 #include "toolkit/core/core.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -76,7 +77,11 @@ std::string FormatText(const krv::FileFormatException& oError)
 {
     const std::string& file = oError.GetFileName();
     if (oError.GetMessage().empty())
-        return fmt::format("{0}: no format recognises this file; try `krv doctor {0}`", file);
+    {
+        const std::string kind = operations::DescribeUnknown(file);
+        return fmt::format("{0}: no format recognises this file{1}{2}; try `krv doctor {0}`", file,
+                           kind.empty() ? "" : ": ", kind);
+    }
     const std::string message = WithFile(file, oError.GetMessage());
     const bool bSaid = message.find("is damaged") != std::string::npos || message.find("not read") != std::string::npos;
     const char* const pGuess = message.find("truncated") != std::string::npos

@@ -68,8 +68,7 @@ std::unique_ptr<TileSource::Work> TileSource::MakeWork(std::size_t nPlane)
         new Work{poPlane, poPlane->moTables.at(moOrigin.mnLevel),
                  TileCodec(*poPlane, {moLayout.GetBlockWidth(), moLayout.GetBlockHeight()}),
                  support::HeldBlocks(ChooseBound(moLayout, nPixelBytes), nPixelBytes, StoreBlock,
-                                     poPlane->moType.GetBits() < 8 ? support::HeldBlocks::Samples::eBits
-                                                                   : support::HeldBlocks::Samples::eValues)});
+                                     poPlane->moType.GetBits() < 8 ? &support::HeldBlocks::SettleBits : nullptr)});
 }
 
 TileSource::Spot TileSource::GetSpot(const support::BlockAddress& oBlock) const

@@ -289,7 +289,7 @@ void FileEditor::Finish()
     support::NewFile oLaidOut(GetFileName(), TakesPlace());
     WriteCloudLayout(moPages, moHeader, *GetFile(), *oLaidOut.GetFile(), moOptions.mbCloud);
     oLaidOut.GetFile()->Flush();
-    oLaidOut.TakeName(TakesPlace());
+    TakeName(oLaidOut);
     SetNamed();
     End();
 }
