@@ -1,5 +1,6 @@
 #include "plugins/support/writing/filewriter.h"
 
+#include "plugins/support/file/scratchfile.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <utility>
@@ -26,6 +27,12 @@ void FileWriter::MakeFile()
 {
     mpoNew = std::make_unique<NewFile>(moFileName, mbReplaces);
     mpoFile = mpoNew->GetFile();
+}
+
+void FileWriter::MakeScratch(const Place& oPlace)
+{
+    const NewFile oTrial(moFileName, mbReplaces, oPlace);
+    mpoFile = MakeScratchFile(moFileName, oPlace);
 }
 
 void FileWriter::RemoveFile() noexcept
