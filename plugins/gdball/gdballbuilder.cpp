@@ -162,16 +162,24 @@ IDataset* GdballBuilder::Open(const std::string& fileName, AccessMode eMode)
     const bool bPicture = IsPicture(fileName);
     if (bPicture && !bLevels && eMode != eUpdate)
         return OpenImage(fileName, eMode).release();
+    const auto Refuse = [&fileName](const char* pWhy)
+    {
+        throw FileFormatException(fileName, fileName + ": " + pWhy);
+    };
     if ((!bLevels && eMode != eUpdate) || krv::ToUpper(fileName).ends_with(".OVR"))
-        return nullptr;
+        Refuse("is no picture, and no levels lie beside it");
     std::unique_ptr<IDataset> poImage = OpenImage(fileName, eMode);
-    if (poImage == nullptr || (!bLevels && HoldsLevels(*poImage)))
-        return nullptr;
+    if (!bLevels && HoldsLevels(*poImage))
+        Refuse("holds its levels itself");
     const auto poShared = std::make_shared<SharedImage>(fileName, std::move(poImage), eMode);
     if (eMode == eUpdate)
         SharedImage::Enter(poShared);
     else if (!poShared->GetLevels().IsOpen())
-        return bPicture ? OpenImage(fileName, eMode).release() : nullptr;
+    {
+        if (bPicture)
+            return OpenImage(fileName, eMode).release();
+        Refuse("what lies beside it are no levels of it");
+    }
     return new GenericDataset(poShared);
 }
 

@@ -17,8 +17,8 @@ public:
     ~GdballBuilder() override;
 
     // A further dataset over a file that stands in the table of open files; else, with levels beside it, the file with
-    // these; else null. For update also a file that can hold no levels of its own, so that they can be made. A picture,
-    // with levels beside it or not, by its name or "name[page=n]".
+    // these; else FileFormatException. For update also a file that can hold no levels of its own, so that they can be
+    // made. A picture, with levels beside it or not, by its name or "name[page=n]".
     krv::datasources::IDataset* Open(const std::string& fileName, AccessMode eMode) override;
     // options: "FTYPE:<type> <options>", or those of a picture by the ending of the name. Throws DataException for a
     // type that no format has.

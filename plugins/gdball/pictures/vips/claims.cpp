@@ -3,6 +3,7 @@
 #include "plugins/gdball/pictures/pnmheader.h"
 #include "plugins/support/codec/checksum.h"
 #include "plugins/support/file/numbers.h"
+#include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -104,40 +105,60 @@ Claims ReadJpegClaims(const File& oFile)
     return oClaims;
 }
 
-Claims ReadPnmClaims(const File& oFile)
+PnmHeader ReadPnmHeader(const File& oFile)
 {
     std::vector<unsigned char> oBytes(4096);
     oBytes.resize(oFile.ReadUpTo(0, oBytes.data(), oBytes.size()));
     const auto oHeader = ParsePnmHeader(oBytes.data(), oBytes.size());
     if (!oHeader)
         Refuse(oFile, "its header is damaged");
-    const std::uint64_t nPixels = oHeader->CountPixelBytes();
-    if (nPixels > oFile.GetSize() || oHeader->mnBytes > oFile.GetSize() - nPixels)
-        CheckFits(oFile, oHeader->mnWidth, oHeader->mnHeight, UINT64_MAX);
+    return *oHeader;
+}
+
+Claims ReadPnmClaims(const File& oFile)
+{
+    const PnmHeader oHeader = ReadPnmHeader(oFile);
+    const std::uint64_t nPixels = oHeader.CountPixelBytes();
+    if (nPixels > oFile.GetSize() || oHeader.mnBytes > oFile.GetSize() - nPixels)
+        CheckFits(oFile, oHeader.mnWidth, oHeader.mnHeight, UINT64_MAX);
     Claims oClaims;
-    oClaims.moHeader = oHeader->Write();
-    oClaims.mnSkipped = oHeader->mnBytes;
+    oClaims.moHeader = oHeader.Write();
+    oClaims.mnSkipped = oHeader.mnBytes;
     return oClaims;
 }
 
-} // namespace
-
-Claims ReadClaims(const File& oFile, PictureKind eKind)
+// Numbers between blanks; bits of PBM need none.
+void CheckText(const File& oFile, const PnmHeader& oHeader)
 {
-    switch (eKind)
+    constexpr std::size_t PIECE = std::size_t{1} << 20;
+    const std::uint64_t nSamples = oHeader.mnWidth * oHeader.mnHeight * oHeader.GetChannels();
+    const std::uint32_t nMost = oHeader.IsBits() ? 1 : ParseNumber<std::uint32_t>(oHeader.moMaximum).value_or(0);
+    std::vector<unsigned char> oPiece(std::min<std::size_t>(PIECE, static_cast<std::size_t>(oFile.GetSize())));
+    std::uint64_t nFound = 0;
+    std::uint32_t nValue = 0;
+    bool bInside = false;
+    for (std::uint64_t nAt = oHeader.mnBytes; nFound < nSamples || bInside; nAt += oPiece.size())
     {
-    case PictureKind::ePng:
-        return ReadPngClaims(oFile);
-    case PictureKind::eJpeg:
-        return ReadJpegClaims(oFile);
-    case PictureKind::ePnm:
-        return ReadPnmClaims(oFile);
-    default:
-        break;
+        const std::size_t nRead = oFile.ReadUpTo(nAt, oPiece.data(), oPiece.size());
+        for (std::size_t nByte = 0; nByte < nRead && (nFound < nSamples || bInside); ++nByte)
+        {
+            const unsigned char nLetter = oPiece[nByte];
+            const bool bDigit = nLetter >= '0' && nLetter <= '9';
+            if (!bDigit && nLetter != ' ' && (nLetter < '\t' || nLetter > '\r'))
+                Refuse(oFile, "byte " + std::to_string(nAt + nByte) + " is no part of a sample");
+            const bool bNew = bDigit && (!bInside || oHeader.IsBits());
+            nValue = bNew ? nLetter - '0' : bDigit ? std::min(nValue * 10 + (nLetter - '0'), 99999u) : nValue;
+            nFound += bNew ? 1 : 0;
+            bInside = bDigit && !oHeader.IsBits();
+            if (bDigit && nValue > nMost)
+                Refuse(oFile, "the sample at byte " + std::to_string(nAt + nByte) + " is larger than the maximum");
+        }
+        if (nRead < oPiece.size())
+            break;
     }
-    Claims oClaims;
-    oClaims.mbWhole = eKind == PictureKind::eGif || eKind == PictureKind::eWebp || eKind == PictureKind::eHeif;
-    return oClaims;
+    if (nFound < nSamples)
+        Refuse(oFile, "the file is cut off: it has " + std::to_string(nFound) + " of " + std::to_string(nSamples) +
+                          " samples");
 }
 
 void CheckPng(const File& oFile)
@@ -173,6 +194,37 @@ void CheckPng(const File& oFile)
             return;
         nAt += nLength + 12;
     }
+}
+
+} // namespace
+
+Claims ReadClaims(const File& oFile, PictureKind eKind)
+{
+    switch (eKind)
+    {
+    case PictureKind::ePng:
+        return ReadPngClaims(oFile);
+    case PictureKind::eJpeg:
+        return ReadJpegClaims(oFile);
+    case PictureKind::ePnm:
+        return ReadPnmClaims(oFile);
+    default:
+        break;
+    }
+    Claims oClaims;
+    oClaims.mbWhole = eKind == PictureKind::eGif || eKind == PictureKind::eWebp || eKind == PictureKind::eHeif;
+    return oClaims;
+}
+
+void CheckWhole(const File& oFile, PictureKind eKind)
+{
+    if (eKind == PictureKind::ePng)
+        return CheckPng(oFile);
+    if (eKind != PictureKind::ePnm)
+        return;
+    const PnmHeader oHeader = ReadPnmHeader(oFile);
+    if (oHeader.IsText())
+        CheckText(oFile, oHeader);
 }
 
 } // namespace krv::plugins::gdball

@@ -20,8 +20,8 @@ struct Claims
 // Throws FileFormatException for a file that is too short for the picture that it claims to be.
 Claims ReadClaims(const support::File& oFile, PictureKind eKind);
 
-// Throws FileFormatException for a PNG that was cut off, or a part of which is not as its checksum says. Reads all of
-// the file.
-void CheckPng(const support::File& oFile);
+// What has to be looked at before pixels can be trusted, since libvips does not: the checksums of PNG and that it is
+// whole, the samples of PNM that is text. Reads all of such a file. Throws FileFormatException.
+void CheckWhole(const support::File& oFile, PictureKind eKind);
 
 } // namespace krv::plugins::gdball

@@ -3,7 +3,9 @@
 #include "plugins/support/file/iccprofile.h"
 #include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/warning.h"
 
+#include <algorithm>
 #include <utility>
 
 namespace krv::plugins::gdball
@@ -14,19 +16,21 @@ using krv::datasources::AuxiliaryData;
 namespace
 {
 
-void DescribeChannels(const VipsImage& oImage, AuxiliaryData& oTags)
+constexpr char INTERPRETATION[] = "ColorInterp";
+constexpr char OPACITY[] = "Alpha";
+
+void DescribeChannels(VipsInterpretation eMeaning, AuxiliaryData& oTags)
 {
     static constexpr const char* COLOURS[] = {"Red", "Green", "Blue"};
-    const VipsInterpretation eMeaning = oImage.Type;
     const bool bColours = eMeaning == VIPS_INTERPRETATION_sRGB || eMeaning == VIPS_INTERPRETATION_RGB16 ||
                           eMeaning == VIPS_INTERPRETATION_scRGB;
     const bool bGrey = eMeaning == VIPS_INTERPRETATION_B_W || eMeaning == VIPS_INTERPRETATION_GREY16;
     const unsigned int nColours = bColours ? 3 : bGrey ? 1 : 0;
     for (unsigned int nAt = 0; nAt < std::min(nColours, oTags.GetChannelCount()); ++nAt)
-        oTags.SetChanMetadataValue("ColorInterp", bColours ? COLOURS[nAt] : "Gray", nAt + 1);
+        oTags.SetChanMetadataValue(INTERPRETATION, bColours ? COLOURS[nAt] : "Gray", nAt + 1);
     if (nColours != 0 && oTags.GetChannelCount() == nColours + 1)
     {
-        oTags.SetChanMetadataValue("ColorInterp", "Alpha", nColours + 1);
+        oTags.SetChanMetadataValue(INTERPRETATION, OPACITY, nColours + 1);
         oTags.SetChanMetadataValue("AlphaKind", eMeaning == VIPS_INTERPRETATION_scRGB ? "Premultiplied" : "Straight",
                                    nColours + 1);
     }
@@ -62,7 +66,7 @@ AuxiliaryData ReadTags(VipsImage& oImage, PictureKind eKind)
         oTags.SetFileMetadataValue("YResolution", NumberText(oImage.Yres * MILLIMETRES));
         oTags.SetFileMetadataValue("ResolutionUnit", "centimetre");
     }
-    DescribeChannels(oImage, oTags);
+    DescribeChannels(oImage.Type, oTags);
     return oTags;
 }
 
@@ -96,6 +100,8 @@ void PictureDataset::Create(unsigned int nWidth, unsigned int nHeight, const std
     CheckCreate(nWidth, nHeight, oTypes, oPlace);
     mpoWriter->Make(nWidth, nHeight, oTypes, oPlace);
     moTags = AuxiliaryData(static_cast<unsigned int>(oTypes.size()));
+    moTags.SetFileMetadataValue("PictureFormat", GetPictureName(mpoWriter->GetKind()));
+    DescribeChannels(mpoWriter->GetMeaning(), moTags);
     SetImage(mpoWriter->GetPixels());
 }
 
@@ -125,7 +131,16 @@ void PictureDataset::WriteAuxiliaryData(const AuxiliaryData& oData)
     if (oData.GetChannelCount() != GetChanCount())
         Refuse("the metadata are those of " + std::to_string(oData.GetChannelCount()) + " channels, not of " +
                std::to_string(GetChanCount()));
-    oAuxXml.SetTags(oData);
+    AuxiliaryData oRest = oData;
+    for (const auto& [key, value] : moTags.GetFileMetadata())
+        if (oData.GetFileMetadataValue(key) == value)
+            oRest.RemoveFileMetadataValue(key);
+    for (unsigned int nChannel = 1; nChannel <= GetChanCount(); ++nChannel)
+        for (const auto& [key, value] : moTags.GetChanMetadata(nChannel))
+            if (oData.GetChanMetadataValue(key, nChannel) == value)
+                oRest.RemoveChanMetadataValue(key, nChannel);
+    mbOpacityMeant = oData.GetChanMetadataValue(INTERPRETATION, GetChanCount()) == OPACITY;
+    oAuxXml.SetTags(oRest);
     StoreBeside(std::move(oAuxXml));
 }
 
@@ -161,6 +176,13 @@ void PictureDataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
 
 void PictureDataset::Synchronize()
 {
+    if (IsWritten() && HasImage() && !mbOpacityMeant &&
+        moTags.GetChanMetadataValue(INTERPRETATION, GetChanCount()) == OPACITY)
+    {
+        krv::nspio::Warning::Warn(GetFileName() + ": in a picture of " + std::to_string(GetChanCount()) +
+                                  " channels the last one is opacity");
+        mbOpacityMeant = true;
+    }
     Dataset::Synchronize();
     if (IsWritten() && HasImage())
         GetSidecars().StoreAuxXml();

@@ -47,6 +47,7 @@ private:
     std::shared_ptr<PictureWriter> mpoWriter; // null when the file is only read
     krv::datasources::AuxiliaryData moTags;   // of the picture itself
     unsigned int mnPages = 1;
+    bool mbOpacityMeant = false; // by whoever writes a channel of it
     mutable std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding;
 };
 

@@ -75,8 +75,8 @@ support::BlockOrigin PictureSource::GetOrigin() const
 // Decoding goes on, or begins anew when the row has passed.
 Decoder& PictureSource::GetDecoder(unsigned int nRow)
 {
-    if (!mbChecked && moPicture.meKind == PictureKind::ePng)
-        CheckPng(*moPicture.mpoFile);
+    if (!mbChecked)
+        CheckWhole(*moPicture.mpoFile, moPicture.meKind);
     mbChecked = true;
     if (mpoDecoder && mpoDecoder->GetNext() <= nRow)
         return *mpoDecoder;

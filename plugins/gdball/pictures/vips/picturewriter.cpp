@@ -10,6 +10,8 @@
 #include <mutex>
 #include <set>
 
+#include <unistd.h>
+
 namespace krv::plugins::gdball
 {
 
@@ -40,14 +42,6 @@ const Limits& GetLimits(PictureKind eKind)
 VipsBandFormat GetFormat(const DataType& oType)
 {
     return oType.IsReal() ? VIPS_FORMAT_FLOAT : oType.GetBits() == 8 ? VIPS_FORMAT_UCHAR : VIPS_FORMAT_USHORT;
-}
-
-VipsInterpretation GetMeaning(VipsBandFormat eFormat, unsigned int nChannels)
-{
-    const bool bColours = nChannels > 2;
-    if (eFormat == VIPS_FORMAT_USHORT)
-        return bColours ? VIPS_INTERPRETATION_RGB16 : VIPS_INTERPRETATION_GREY16;
-    return bColours ? VIPS_INTERPRETATION_sRGB : VIPS_INTERPRETATION_B_W;
 }
 
 // The waiting pixels as libvips asks for them, from several threads.
@@ -103,13 +97,21 @@ Owned<VipsOperation> NewSaver(PictureKind eKind, const PictureOptions& oOptions)
     case PictureKind::eWebp:
     {
         Owned<VipsOperation> poSaver(vips_operation_new("webpsave_target"));
-        g_object_set(poSaver.get(), "Q", nQuality, "lossless", static_cast<gboolean>(oOptions.mbLossless), "exact",
-                     TRUE, nullptr);
+        g_object_set(poSaver.get(), "Q", nQuality, "lossless", static_cast<gboolean>(oOptions.mbLossless), nullptr);
         return poSaver;
     }
     default:
         return Owned<VipsOperation>(vips_operation_new("ppmsave_target"));
     }
+}
+
+// A saver of libvips hands its work to threads that libvips keeps for a while. They do not follow into a forked
+// process, where it would wait for them for good.
+void CheckThreads(const std::string& fileName)
+{
+    static const pid_t snFirst = ::getpid();
+    if (::getpid() != snFirst)
+        throw DataException(fileName + ": a process that was forked from one that wrote pictures cannot write any");
 }
 
 } // namespace
@@ -179,6 +181,14 @@ void PictureWriter::Make(unsigned int nWidth, unsigned int nHeight, const std::v
     mbChanged = true;
 }
 
+VipsInterpretation PictureWriter::GetMeaning() const
+{
+    const bool bColours = mpoPixels->GetLayout().GetChannelCount() > 2;
+    if (GetFormat(mpoPixels->GetLayout().GetPlane(0).moType) == VIPS_FORMAT_USHORT)
+        return bColours ? VIPS_INTERPRETATION_RGB16 : VIPS_INTERPRETATION_GREY16;
+    return bColours ? VIPS_INTERPRETATION_sRGB : VIPS_INTERPRETATION_B_W;
+}
+
 void PictureWriter::Change()
 {
     CheckWritable();
@@ -189,6 +199,7 @@ void PictureWriter::Store()
 {
     if (!mbChanged && IsNamed())
         return;
+    CheckThreads(GetFileName());
     support::NewFile oNew(GetFileName(), TakesPlace());
     Save(*oNew.GetFile());
     oNew.GetFile()->Flush();
@@ -208,8 +219,7 @@ void PictureWriter::Save(support::File& oFile) const
     Listener oListener(GetFileName(), oSaid);
     const Owned<VipsImage> poImage(vips_image_new());
     vips_image_init_fields(poImage.get(), static_cast<int>(oLayout.GetWidth()), static_cast<int>(oLayout.GetHeight()),
-                           static_cast<int>(nChannels), eFormat, VIPS_CODING_NONE, GetMeaning(eFormat, nChannels), 1.0,
-                           1.0);
+                           static_cast<int>(nChannels), eFormat, VIPS_CODING_NONE, GetMeaning(), 1.0, 1.0);
     vips_image_set_int(poImage.get(), VIPS_META_CONCURRENCY, 1);
     bool bDone = vips_image_pipelinev(poImage.get(), VIPS_DEMAND_STYLE_THINSTRIP, nullptr) == 0 &&
                  vips_image_generate(poImage.get(), nullptr, &Waiting::OnGenerate, nullptr, &oWaiting, nullptr) == 0;

@@ -9,6 +9,8 @@
 #include <string>
 #include <vector>
 
+#include <vips/vips.h>
+
 namespace krv::plugins::gdball
 {
 
@@ -37,6 +39,9 @@ public:
     void Make(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes,
               const Place& oPlace);
     const std::shared_ptr<support::PlainSource>& GetPixels() const { return mpoPixels; }
+    PictureKind GetKind() const { return meKind; }
+    // What readers will take the channels for.
+    VipsInterpretation GetMeaning() const;
     // Throws DataException when writing has ended.
     void Change();
 

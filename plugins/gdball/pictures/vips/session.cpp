@@ -101,10 +101,8 @@ void Listener::Fail(const std::string& what, const Place& oPlace)
 {
     std::string cause = TakeErrors();
     if (cause.empty() && !moTexts.empty())
-    {
         cause = moTexts.back();
-        moTexts.pop_back();
-    }
+    moTexts.clear();
     throw FileFormatException(
         moFileName, moFileName + ": " + what + ": " + (cause.empty() ? "libvips does not say why" : cause), oPlace);
 }

@@ -27,7 +27,7 @@ public:
     Listener& operator=(const Listener&) = delete;
 
     // Throws FileFormatException that names the file, with what libvips gives as the cause, in an error or else in a
-    // warning. what: such as "cannot be opened".
+    // warning; these are passed on no more. what: such as "cannot be opened".
     [[noreturn]] void Fail(const std::string& what, const Place& oPlace = Place::Current());
 
     void Take(const char* pText) noexcept;
