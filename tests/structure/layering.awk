@@ -38,6 +38,7 @@ BEGIN {
     home["^(CLI|nlohmann)/"] = "^tools/";
     home["^fmt/"] = "^(operations|tools)/";
     home["^png\\.h"] = "^operations/";
+    home["^vips/"] = "^plugins/gdball/pictures/vips/";
     # Their traces in public headers, which everybody who includes them has to have installed.
     split("toolkit/xml/xmldocument.h toolkit/xml/xmlutil.h datasources/iomanager/xalanselect.h", names, " ");
     for (n in names)

@@ -506,7 +506,7 @@ TEST(Convert, FailuresLeaveNothingBehindAndTheOldFileAsItWas)
                                {{a, out, "--options", "PREDICTOR=3 COMPRESS=LZW"}, 2, "8U"},
                                {{a, out, "--window", "0,0,99999999999,5"}, 2, "above 4294967295"},
                                {{a, out, "--channels", ""}, 2, "--channels: the value is empty"},
-                               {{a, oFolder.File("out.png")}, 2, "extension .png"},
+                               {{a, oFolder.File("out.bmp")}, 2, "extension .bmp"},
                                {{a, oFolder.GetPath() + "/none/out.tif"}, 1, "there is no folder " + oFolder.GetPath()},
                                {{a, oFolder.GetPath()}, 1, "no plain file"}});
     // A file that ends in the middle of its pixels fails on the way.

@@ -55,6 +55,9 @@ protected:
     void TakeName(NewFile& oNew) const;
 
     void MakeFile();
+    // In place of it: a file without a name for what is written, in the folder of scratch files, of which Store makes
+    // that which takes the name. Throws as NewFile when that could not be made.
+    void MakeScratch(const Place& oPlace = Place::Current());
     // Back to before MakeFile.
     void RemoveFile() noexcept;
     // Ends writing, without storing anything.
