@@ -383,8 +383,8 @@ std::string DescribeUnknown(const std::string& file)
         return "it begins like " + kind;
     const std::filesystem::path oPath(file);
     for (const std::string& header :
-         {file + ".rsc", file + ".par", oPath.parent_path() / (oPath.stem().string() + ".par"),
-          oPath.parent_path() / (oPath.stem().string() + "_dem.par")})
+         {file + ".rsc", file + ".par", (oPath.parent_path() / oPath.stem()).string() + ".par",
+          (oPath.parent_path() / oPath.stem()).string() + "_dem.par"})
     {
         std::error_code oNone;
         if (std::filesystem::is_regular_file(header, oNone))
@@ -414,8 +414,8 @@ std::vector<Finding> CheckFile(const std::string& file, const std::vector<Loaded
     bool bRecognised = false;
     for (const LoadedPlugin& oPlugin : oPlugins)
         AskPlugin(file, oPlugin, oHeader, bRecognised, oFindings);
-    if (const std::string kind = bRecognised ? std::string() : DescribeUnknown(file); !kind.empty())
-        oFindings.push_back({false, "file " + file, "no format recognises it: " + kind, {}});
+    if (const std::string cause = bRecognised ? std::string() : DescribeUnknown(file); !cause.empty())
+        oFindings.push_back({false, "file " + file, "no format recognises it: " + cause, {}});
     else if (!bRecognised)
         oFindings.push_back({false, "file " + file, "no format recognises it",
                              "install the plug-in of its format, or convert it to one that `krv formats` lists"});

@@ -185,7 +185,7 @@ void PictureDataset::Synchronize()
     }
     Dataset::Synchronize();
     if (IsWritten() && HasImage())
-        GetSidecars().StoreAuxXml();
+        GetSidecars().Store();
 }
 
 void PictureDataset::Close()
