@@ -36,6 +36,19 @@ void* MapAligned(std::size_t nBytes) noexcept
     return pFirst + nBefore;
 }
 
+// The heap takes the room of a freed block for another of the same size only when it is not asked for an alignment of
+// its own: passes through many tiles would make it grow. The byte before the block says how far behind the heap's own
+// pointer it lies.
+void* NewHeapBlock(std::size_t nBytes) noexcept
+{
+    auto* const pHeap = static_cast<unsigned char*>(std::malloc(nBytes + ALIGNMENT));
+    if (pHeap == nullptr)
+        return nullptr;
+    const std::size_t nSkipped = ALIGNMENT - reinterpret_cast<std::uintptr_t>(pHeap) % ALIGNMENT;
+    pHeap[nSkipped - 1] = static_cast<unsigned char>(nSkipped);
+    return pHeap + nSkipped;
+}
+
 } // namespace
 
 void* NewSystemBlock(std::size_t nBytes, std::size_t nUsed) noexcept
@@ -49,16 +62,16 @@ void* NewSystemBlock(std::size_t nBytes, std::size_t nUsed) noexcept
             madvise(pBlock, nUsed / LARGE_PAGE * LARGE_PAGE, MADV_HUGEPAGE);
         return pBlock;
     }
-    void* pBlock = nullptr;
-    return posix_memalign(&pBlock, ALIGNMENT, nBytes) == 0 ? pBlock : nullptr;
+    return NewHeapBlock(nBytes);
 }
 
 void DeleteSystemBlock(void* pBlock, std::size_t nBytes) noexcept
 {
+    auto* const pBytes = static_cast<unsigned char*>(pBlock);
     if (nBytes >= SMALLEST_MAPPED)
         munmap(pBlock, RoundUp(nBytes, LARGE_PAGE));
-    else
-        std::free(pBlock);
+    else if (pBytes != nullptr)
+        std::free(pBytes - pBytes[-1]);
 }
 
 } // namespace krv::core::detail
