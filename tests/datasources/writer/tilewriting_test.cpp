@@ -1,5 +1,7 @@
 #include "datasources/writer/tilewriting.h"
 
+#include "datasources/reader/exacthaloreader.h"
+#include "datasources/utils/open.h"
 #include "datasources/writer/basicwriter.h"
 #include "tests/datasources/reader/readertest.h"
 #include "toolkit/threading/threadpool.h"
@@ -41,9 +43,9 @@ protected:
     // Of tiles that consist of whole blocks, or of others.
     ReaderFactory MakeReaders(unsigned int nTile) const
     {
-        return [oReaders = MakeExactReaders(moScene, {1}, 2, 1, eMirror), nTile]
+        return [this, nTile]
         {
-            auto poReader = oReaders();
+            auto poReader = OpenHaloReader(moScene, {1}, 2);
             poReader->SetTileSize(nTile, nTile);
             return poReader;
         };
@@ -58,7 +60,7 @@ protected:
         const unsigned int nWidth = poTile->GetWidth();
         for (std::size_t n = 0; n < poResult->GetBufferSize(); ++n)
         {
-            const unsigned char* const pPixel = poTile->GetBuffer() + (n / nWidth + 1) * (nWidth + 4) + n % nWidth + 2;
+            const unsigned char* const pPixel = poTile->GetBuffer() + (n / nWidth + 2) * (nWidth + 4) + n % nWidth + 2;
             poResult->GetBuffer()[n] =
                 static_cast<unsigned char>(pPixel[0] - pPixel[-1 - static_cast<int>(nWidth + 4)]);
         }
