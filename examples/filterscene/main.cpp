@@ -28,7 +28,7 @@ int main(int, char** pFiles)
     {
         return krv::OpenHaloReader(pFiles[1], {1}, 1);
     }; // one for each thread
-    const auto Show = [](unsigned int n, unsigned int nAll)
+    const auto Show = [](auto n, auto nAll)
     {
         return (std::cerr << n << '/' << nAll << '\r') && !gnStopped;
     };
