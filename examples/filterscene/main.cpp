@@ -5,7 +5,6 @@
 #include <iostream>
 
 static volatile std::sig_atomic_t gnStopped = 0;
-
 static std::unique_ptr<krv::Raster> Smooth(std::unique_ptr<krv::Raster> poTile) // on any thread
 {
     auto poResult =
@@ -28,15 +27,17 @@ int main(int, char** pFiles)
     {
         return krv::OpenHaloReader(pFiles[1], {1}, 1);
     }; // one for each thread
-    const auto Show = [](auto n, auto nAll)
-    {
-        return (std::cerr << n << '/' << nAll << '\r') && !gnStopped;
-    };
     const auto poScene = Open();
     const krv::RasterInfo oInfo(poScene->GetWidth(), poScene->GetHeight(), 1, krv::eDT_8U);
     const auto poWriter = krv::CreateWriter(pFiles[2], oInfo, "TIF", "COMPRESS=DEFLATE");
     krv::CopyAllButPixels(*poScene, *poWriter);
     krv::ThreadPool oThreads;
-    if (krv::WriteTiles(Open, Smooth, *poWriter, {&oThreads, {}, Show}))
+    krv::TileJob oJob{&oThreads,
+                      {},
+                      [](auto n, auto nAll)
+                      {
+                          return (std::cerr << n << '/' << nAll << '\r') && !gnStopped;
+                      }};
+    if (krv::WriteTiles(Open, Smooth, *poWriter, oJob))
         poWriter->Synchronize();
 }
