@@ -1,9 +1,7 @@
 // Smooths the first channel of an 8-bit scene on all cores, without seams; Ctrl-C stops it and leaves nothing.
-#include <krv/krv.h>
-
 #include <csignal>
 #include <iostream>
-
+#include <krv/krv.h>
 static volatile std::sig_atomic_t gnStopped = 0;
 static std::unique_ptr<krv::Raster> Smooth(std::unique_ptr<krv::Raster> poTile) // on any thread
 {
@@ -19,25 +17,22 @@ static std::unique_ptr<krv::Raster> Smooth(std::unique_ptr<krv::Raster> poTile) 
     }
     return poResult;
 }
-
+static bool Show(unsigned int n, unsigned int nAll)
+{
+    return (std::cerr << n << '/' << nAll << '\r') && gnStopped == 0;
+}
 int main(int, char** pFiles)
 {
     std::signal(SIGINT, [](int) { gnStopped = 1; });
-    const auto Open = [pFiles]
+    const auto Open = [pFiles] // one for each thread
     {
         return krv::OpenHaloReader(pFiles[1], {1}, 1);
-    }; // one for each thread
+    };
     const auto poScene = Open();
     const krv::RasterInfo oInfo(poScene->GetWidth(), poScene->GetHeight(), 1, krv::eDT_8U);
     const auto poWriter = krv::CreateWriter(pFiles[2], oInfo, "TIF", "COMPRESS=DEFLATE");
     krv::CopyAllButPixels(*poScene, *poWriter);
     krv::ThreadPool oThreads;
-    krv::TileJob oJob{&oThreads,
-                      {},
-                      [](auto n, auto nAll)
-                      {
-                          return (std::cerr << n << '/' << nAll << '\r') && !gnStopped;
-                      }};
-    if (krv::WriteTiles(Open, Smooth, *poWriter, oJob))
+    if (krv::WriteTiles(Open, Smooth, *poWriter, {&oThreads, {}, Show}))
         poWriter->Synchronize();
 }
