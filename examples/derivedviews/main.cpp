@@ -4,6 +4,7 @@
 #include "datasources/datasets/constrasterdataset.h"
 #include "datasources/datasets/memorydataset.h"
 #include "datasources/datasets/metacomplexdataset.h"
+#include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/derived/pctrasterreader.h"
 #include "datasources/reader/derived/rastercache.h"
@@ -147,7 +148,7 @@ void ShowMemory(IRasterReader& oScene, const std::string& constFile, const std::
     Store(oColour, constFile);
     TransformRasterReader oSmall(&oScene, Reduce(oScene), {SIDE, SIDE, Resampling::eAverage}, false);
     MemoryOptions oOptions;
-    oOptions.mdFill = 230;
+    oOptions.mnFill = 230;
     MemoryWriter oWriter({SIDE, SIDE, 3, krv::gobs::eDT_8U}, oOptions);
     for (const unsigned int nX : {0u, 256u})
         oWriter.WriteRaster(RasterPtr(oSmall.ReadRaster(nX, nX, 256, 256)).get());
