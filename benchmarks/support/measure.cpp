@@ -6,11 +6,31 @@
 #include <numeric>
 #include <random>
 
+#include <time.h>
+
 namespace krv::benchmarks
 {
 
-double Seconds(const std::function<void()>& oRun)
+namespace
 {
+
+double ProcessorSeconds()
+{
+    timespec oTime{};
+    clock_gettime(CLOCK_THREAD_CPUTIME_ID, &oTime);
+    return static_cast<double>(oTime.tv_sec) + 1e-9 * static_cast<double>(oTime.tv_nsec);
+}
+
+} // namespace
+
+double Seconds(const std::function<void()>& oRun, Clock eClock)
+{
+    if (eClock == Clock::eProcessor)
+    {
+        const double nStart = ProcessorSeconds();
+        oRun();
+        return ProcessorSeconds() - nStart;
+    }
     const auto oStart = std::chrono::steady_clock::now();
     oRun();
     return std::chrono::duration<double>(std::chrono::steady_clock::now() - oStart).count();
@@ -22,7 +42,7 @@ double Median(std::vector<double> oValues)
     return oValues[oValues.size() / 2];
 }
 
-std::vector<double> MedianSeconds(const std::vector<Candidate>& oCandidates, int nRounds)
+std::vector<double> MedianSeconds(const std::vector<Candidate>& oCandidates, int nRounds, Clock eClock)
 {
     std::vector<std::size_t> oOrder(oCandidates.size());
     std::iota(oOrder.begin(), oOrder.end(), std::size_t{0});
@@ -34,7 +54,7 @@ std::vector<double> MedianSeconds(const std::vector<Candidate>& oCandidates, int
     {
         std::shuffle(oOrder.begin(), oOrder.end(), oRandom);
         for (const std::size_t nIndex : oOrder)
-            oTimes[nIndex].push_back(Seconds(oCandidates[nIndex].moRun));
+            oTimes[nIndex].push_back(Seconds(oCandidates[nIndex].moRun, eClock));
     }
     std::vector<double> oMedians;
     for (const auto& oValues : oTimes)

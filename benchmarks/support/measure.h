@@ -8,8 +8,16 @@
 namespace krv::benchmarks
 {
 
-// The wall time of one run, and the middle one of several values.
-double Seconds(const std::function<void()>& oRun);
+// What a run takes: by the clock on the wall, or of the processor by the calling thread alone, which other programs on
+// a busy machine do not count into.
+enum class Clock
+{
+    eWall,
+    eProcessor
+};
+
+// The time of one run, and the middle one of several values.
+double Seconds(const std::function<void()>& oRun, Clock eClock = Clock::eWall);
 double Median(std::vector<double> oValues);
 
 struct Candidate
@@ -20,7 +28,7 @@ struct Candidate
 
 // Runs every candidate once unmeasured, then nRounds times in turn with the order changed every round, and returns the
 // median seconds of each.
-std::vector<double> MedianSeconds(const std::vector<Candidate>& oCandidates, int nRounds);
+std::vector<double> MedianSeconds(const std::vector<Candidate>& oCandidates, int nRounds, Clock eClock = Clock::eWall);
 
 // One row of the table: what was measured, the ratio, the goal (0: none) and remarks.
 void PrintRow(const std::string& workload, double nRatio, double nGoal, const std::string& remarks = {});

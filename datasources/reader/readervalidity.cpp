@@ -33,9 +33,11 @@ std::unique_ptr<ValiditySource> MakeSource(const IRasterReader& oReader, krv::go
 ReaderValidity::ReaderValidity(IRasterReader& oReader, krv::gobs::BkgdRule eRule)
     : moReader(oReader), mpoFacet(dynamic_cast<IValidityReader*>(&oReader))
 {
-    if (mpoFacet == nullptr)
+    const bool bEach = eRule == krv::gobs::eAnyChannel && oReader.GetChansCount() > 1;
+    if (mpoFacet == nullptr || bEach)
         mpoSource = MakeSource(oReader, eRule);
-    else if (eRule == krv::gobs::eAnyChannel && oReader.GetChansCount() > 1)
+    // Beside the reader's own word values are enough, unless channels have masks of their own.
+    if (mpoFacet != nullptr && bEach && !mpoSource->HasChannelMasks())
         mpoSource = std::make_unique<ValiditySource>(oReader, eRule);
     const bool bSource =
         mpoSource != nullptr && (mpoSource->HasNoData() || mpoSource->HasBitmap() || mpoSource->HasAlpha());

@@ -41,14 +41,6 @@ void Add(Mask& oBackground, const Mask& oOther)
         pBits[n] |= pOther[n];
 }
 
-void KeepCommon(Mask& oBackground, const Mask& oOther)
-{
-    unsigned char* const pBits = oBackground.GetBits();
-    const unsigned char* const pOther = oOther.GetBits();
-    for (std::uint64_t n = 0; n < oBackground.GetBitsSize(); ++n)
-        pBits[n] &= pOther[n];
-}
-
 void AddOutside(Mask& oBackground, unsigned int nImageWidth, unsigned int nImageHeight)
 {
     const std::int64_t nLeft = std::int64_t{oBackground.GetX()} - oBackground.GetXMargin();
@@ -259,7 +251,7 @@ std::unique_ptr<Mask> ValiditySource::CombineChannels(const Raster& oRaster) con
         if (poAll == nullptr)
             poAll = std::move(poOne);
         else if (meRule == krv::gobs::eAllChannels)
-            KeepCommon(*poAll, *poOne);
+            poAll->KeepCommon(*poOne);
         else
             Add(*poAll, *poOne);
     }

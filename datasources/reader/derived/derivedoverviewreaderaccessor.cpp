@@ -2,7 +2,9 @@
 
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/irasterreader.h"
+#include "toolkit/exceptions/exceptions.h"
 
+#include <string>
 #include <utility>
 
 namespace krv::datasources
@@ -23,7 +25,15 @@ AuxiliaryData DerivedOverviewReaderAccessor::GetAuxiliaryData(unsigned int nLeve
 
 IRasterReader* DerivedOverviewReaderAccessor::CreateRasterReader(unsigned int nLevel)
 {
-    return moWrap(std::unique_ptr<IRasterReader>(mpoLevels->CreateRasterReader(nLevel))).release();
+    return moWrap(OpenWrapped(nLevel)).release();
+}
+
+std::unique_ptr<IRasterReader> DerivedOverviewReaderAccessor::OpenWrapped(unsigned int nLevel)
+{
+    std::unique_ptr<IRasterReader> poLevel(mpoLevels->CreateRasterReader(nLevel));
+    if (poLevel == nullptr)
+        throw krv::DataException("The source gave no reader of level " + std::to_string(nLevel));
+    return poLevel;
 }
 
 } // namespace krv::datasources

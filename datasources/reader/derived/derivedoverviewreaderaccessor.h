@@ -32,6 +32,8 @@ public:
     IRasterReader* CreateRasterReader(unsigned int nLevel) override;
 
 protected:
+    // A reader of the other accessor. Throws DataException when that gives none.
+    std::unique_ptr<IRasterReader> OpenWrapped(unsigned int nLevel);
     IOverviewReaderAccessor& GetWrapped() { return *mpoLevels; }
 
 private:

@@ -295,8 +295,7 @@ public:
         std::unique_lock<std::mutex> oLock;
         if (!mpoCore->moMake)
             oLock = std::unique_lock(mpoCore->moSourceMutex);
-        return new RasterCache(mpoCore, nLevel,
-                               std::unique_ptr<IRasterReader>(GetWrapped().CreateRasterReader(nLevel)));
+        return new RasterCache(mpoCore, nLevel, OpenWrapped(nLevel));
     }
 
 private:

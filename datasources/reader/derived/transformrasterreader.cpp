@@ -331,6 +331,8 @@ private:
         if (oLevel.mpoReader == nullptr)
         {
             oLevel.mpoReader.reset(mpoLevels->CreateRasterReader(nLevel));
+            if (oLevel.mpoReader == nullptr)
+                return nullptr;
             const IRasterReader& oReader = *oLevel.mpoReader;
             if (oReader.GetWidth() == 0 || oReader.GetHeight() == 0 || oReader.GetChansCount() != mnChannels ||
                 oReader.GetDataType() != moSource.GetDataType())

@@ -53,10 +53,11 @@ struct Interleaving
         moIndices = _mm512_load_si512(aIndices);
     }
 
-    // The third part stands for the fourth where there is none.
     __m512i Take(const __m512i* pParts) const
     {
         const __m512i oFirst = _mm512_permutex2var_epi8(pParts[0], moIndices, pParts[1]);
+        if constexpr (PARTS == 3)
+            return _mm512_mask_permutexvar_epi8(oFirst, moIsLater, moIndices, pParts[2]);
         const __m512i oLater = _mm512_permutex2var_epi8(pParts[2], moIndices, pParts[PARTS - 1]);
         return _mm512_mask_blend_epi8(moIsLater, oFirst, oLater);
     }
