@@ -207,7 +207,7 @@ std::size_t ReverseVectors(const unsigned char* source, unsigned char* destinati
 {
     static constexpr Shuffle TURNED =
         Shuffle::Make([](std::size_t i) { return (i & 1) << 3 | (i & 2) << 1 | (i & 4) >> 1 | (i & 8) >> 3; });
-    const Vector oTurned = LoadVector(TURNED.maIndices);
+    const Vector oTurned = LoadVector(TURNED.moIndices);
     const Vector oLowBits = _mm_set1_epi8(15);
     std::size_t i = 0;
     for (; i + 16 <= nBytes; i += 16)
@@ -279,7 +279,7 @@ void UnpackSingleBits(const unsigned char* source, std::size_t nBytes, unsigned 
     for (; i + 16 <= nWhole; i += 16)
     {
         const Vector oBytes = LoadVector(source + i);
-        Vector oPlaces = LoadVector(FIRST.maIndices);
+        Vector oPlaces = LoadVector(FIRST.moIndices);
         for (std::size_t k = 0; k < 8; ++k, oPlaces = _mm_add_epi8(oPlaces, oTwo))
             StoreVector(destination + i * 8 + k * 16,
                         _mm_min_epu8(_mm_and_si128(_mm_shuffle_epi8(oBytes, oPlaces), oBits), oOne));
