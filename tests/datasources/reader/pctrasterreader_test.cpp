@@ -8,7 +8,6 @@
 #include "gobs/raster/rasterview.h"
 #include "tests/datasources/reader/readertest.h"
 
-
 namespace krv::test
 {
 
