@@ -266,7 +266,10 @@ std::uint64_t SpreadBits(unsigned char nBits)
     return (nApart + 0x7F7F7F7F7F7F7F7FU) >> 7 & 0x0101010101010101U;
 }
 
-// A row of pixels of one bit, of which nBytes bytes can be read.
+// A row of pixels of one bit, of which nBytes bytes can be read. Sixteen bytes of it become eight vectors:
+//     byte k twice eight times   b0 b0 b0 b0 b0 b0 b0 b0 b1 b1 ..
+//     and                        80 40 20 10 08 04 02 01 80 40 ..
+//     at most one                1 or 0 in each byte
 void UnpackSingleBits(const unsigned char* source, std::size_t nBytes, unsigned char* destination, std::size_t nSamples)
 {
     const std::size_t nWhole = std::min(nBytes, nSamples / 8);
