@@ -163,4 +163,30 @@ TEST_F(DerivedReaderTest, LevelsAreWrappedAndMarginsAreTheSources)
     EXPECT_EQ(Bytes(*oExactLevel), expected);
 }
 
+// Through any reader the same pixels are valid: by no-data, mask bitmap and alpha of the dataset behind it.
+TEST_F(DerivedReaderTest, ValidityIsThatOfTheSource)
+{
+    moModel->moBitmaps = {{1, ""}};
+    moModel->moAuxiliary.SetFileMetadataValue("NO_DATA_VALUE", "7");
+    moModel->moAuxiliary.SetChanMetadataValue("ColorInterp", "Alpha", 3);
+    const auto dataset = MakeDataset();
+    BasicReader oBasic(dataset.get(), {2, 1}, false);
+    ExactHaloReader oHalo(&oBasic, false);
+    MultiTypeReader oMulti(dataset.get(), {2, 1});
+    const RasterPtr oRaster(oBasic.GetRaster(0));
+    std::vector<std::string> oMasks;
+    for (const IRasterReader* const poReader :
+         {static_cast<IRasterReader*>(&oBasic), static_cast<IRasterReader*>(&oHalo),
+          static_cast<IRasterReader*>(&oMulti)})
+    {
+        const auto& oAccess = dynamic_cast<const IDatasetAccess&>(*poReader);
+        const ValiditySource oSource(oAccess.GetDataset(), oAccess.GetChannels());
+        EXPECT_TRUE(oSource.HasNoData() && oSource.HasBitmap() && oSource.HasAlpha());
+        const std::unique_ptr<krv::gobs::Mask> oMask(oSource.BuildMask(*oRaster));
+        oMasks.emplace_back(reinterpret_cast<const char*>(oMask->GetBits()), oMask->GetBitsSize());
+    }
+    EXPECT_EQ(oMasks[1], oMasks[0]);
+    EXPECT_EQ(oMasks[2], oMasks[0]);
+}
+
 } // namespace krv::test

@@ -7,6 +7,9 @@
 #include "gobs/pct/pct.h"
 #include "gobs/raster/rasterview.h"
 #include "tests/datasources/reader/readertest.h"
+#include "tests/support/facts.h"
+
+#include <filesystem>
 
 namespace krv::test
 {
@@ -235,6 +238,46 @@ TEST_F(PCTRasterReaderTest, NothingLeaksAtTheNthCall)
     FailAtEveryCall(OverReader, [] {});
     FailAtEveryCall(OverFile, [] {});
     FailAtEveryCall(OverDataset, [] {});
+}
+
+// A file's own table, that of another file by reference, and the colours of all palettes of the real data.
+TEST(PCTRasterReaderFiles, PalettesOfFilesAreFound)
+{
+    unsigned int nFiles = 0;
+    std::error_code oNone;
+    for (const auto& oEntry : std::filesystem::directory_iterator(DataFolder() + "/palette", oNone))
+    {
+        const std::string file = oEntry.path().string();
+        if (!file.ends_with(".tif") && !file.ends_with(".tiff"))
+            continue;
+        SCOPED_TRACE(file);
+        BasicReader oValues(file, std::vector<unsigned int>{1});
+        std::unique_ptr<PCTRasterReader> oReader;
+        const std::string error = Error([&] { oReader = std::make_unique<PCTRasterReader>(file); });
+        if (!error.empty())
+        {
+            EXPECT_NE(error.find("has no colour table"), std::string::npos) << error;
+            continue;
+        }
+        ++nFiles;
+        ReaderValidity oValidity(oValues);
+        const unsigned int nWidth = std::min(oValues.GetWidth(), 300u);
+        const unsigned int nHeight = std::min(oValues.GetHeight(), 300u);
+        const RasterPtr oPixels(oValues.ReadRaster(0, 0, nWidth, nHeight));
+        const auto oMask = oValidity.Read(*oPixels);
+        const RasterPtr oColours(oReader->ReadRaster(0, 0, nWidth, nHeight));
+        EXPECT_EQ(PixelsOf(*oColours),
+                  ColoursOf(*oPixels, oReader->GetTable(), oReader->GetChansCount() == 4, oMask.get()));
+        // The same table for a channel of another file, by reference.
+        const auto poModel = std::make_shared<ImageModel>();
+        poModel->moAuxiliary.SetChanMetadataValue("DEFAULT_PCT_REF", "gdb:" + file + "/{PCT:1}", 2);
+        SyntheticDataset oOther(poModel);
+        EXPECT_EQ(PCTRasterReader(&oOther, 2, false).GetTable().GetEntries().size(),
+                  oReader->GetTable().GetEntries().size());
+    }
+    if (nFiles == 0)
+        GTEST_SKIP() << "no palettes there";
+    EXPECT_GE(nFiles, 8u);
 }
 
 } // namespace krv::test

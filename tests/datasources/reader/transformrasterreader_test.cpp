@@ -1,6 +1,7 @@
 #include "datasources/reader/derived/transformrasterreader.h"
 
 #include "datasources/metadata/typednodata.h"
+#include "datasources/reader/exacthaloreader.h"
 #include "datasources/reader/readervalidity.h"
 #include "gobs/mask/mask.h"
 #include "gobs/raster/pixelvalue.h"
@@ -376,6 +377,56 @@ TEST_F(TransformRasterReaderTest, WhatIsNotValidTakesNoPart)
                     Compare(*oSource, oMap, eMethod);
                     if (HasFatalFailure())
                         return;
+                }
+            }
+        }
+    }
+}
+
+// A result does not depend on windows and tiles, and margins are those of the whole.
+TEST_F(TransformRasterReaderTest, AnyWindowIsACropOfTheWhole)
+{
+    mpoModel->moAuxiliary.SetChanMetadataValue("NO_DATA_VALUE", "60", 1);
+    std::mt19937 oRandom(11);
+    const auto Number = [&](unsigned int nMost)
+    {
+        return static_cast<unsigned int>(oRandom() % (nMost + 1));
+    };
+    for (const NativeDataTypeCode eType : {eDT_8U, eDT_32R})
+    {
+        const auto oSource = Source(eType, 3);
+        for (const auto& [name, oMap] : Maps())
+        {
+            for (const Resampling eMethod : METHODS)
+            {
+                SCOPED_TRACE(DataType(eType).Describe() + ", " + name + ", " + GetResamplingName(eMethod));
+                TransformRasterReader oReader(oSource.get(), std::make_shared<AffineMap>(oMap), {31, 27, eMethod},
+                                              false);
+                ReaderValidity oValidity(oReader);
+                const RasterPtr oWhole(oReader.ReadRaster(0, 0, 31, 27));
+                const auto oWholeMask = oValidity.Read(*oWhole);
+                std::string bits;
+                for (unsigned int n = 0; n < 31 * 27; ++n)
+                    bits += oWholeMask == nullptr || oWholeMask->GetBit(n % 31, n / 31) ? '\1' : '\0';
+                MemoryReader oStored(moDataset, 31, 27, {1, 2, 3}, eType, PixelsOf(*oWhole));
+                MemoryReader oStoredBits(moDataset, 31, 27, {1}, eDT_8U, bits);
+                ExactHaloReader oPixels(&oStored, false), oBits(&oStoredBits, false);
+                for (unsigned int n = 0; n < 8; ++n)
+                {
+                    const unsigned int x = Number(30), y = Number(26), w = 1 + Number(30 - x), h = 1 + Number(26 - y);
+                    const unsigned int xm = n % 2 != 0 ? Number(12) : 0, ym = n % 2 != 0 ? Number(9) : 0;
+                    for (IRasterReader* const poReader :
+                         {static_cast<IRasterReader*>(&oReader), static_cast<IRasterReader*>(&oPixels),
+                          static_cast<IRasterReader*>(&oBits)})
+                        poReader->SetMargins(xm, ym, n % 4 == 1 ? eWrap : eMirror101);
+                    const RasterPtr oWindow(oReader.ReadRaster(x, y, w, h)), oCrop(oPixels.ReadRaster(x, y, w, h)),
+                        oCropBits(oBits.ReadRaster(x, y, w, h));
+                    ASSERT_EQ(PixelsOf(*oWindow), PixelsOf(*oCrop)) << x << " " << y << " " << w << " " << h;
+                    const auto oMask = oValidity.Read(*oWindow);
+                    for (std::uint64_t i = 0; i < oCropBits->GetBufferSize(); ++i)
+                        ASSERT_EQ(oMask == nullptr ||
+                                      oMask->GetBit(i % oMask->GetFullWidth(), i / oMask->GetFullWidth()),
+                                  oCropBits->GetBuffer()[i] != 0);
                 }
             }
         }
