@@ -7,7 +7,9 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/metadata/auxdatadefaultrgbgtfm.h"
 #include "datasources/metadata/auxiliarydata.h"
+#include "datasources/metadata/detail/metadatakeys.h"
 #include "datasources/metadata/pixelstatistics.h"
+#include "datasources/metadata/referencetag.h"
 #include "datasources/reader/idatasetaccess.h"
 #include "datasources/writer/irasterwriter.h"
 #include "gobs/pct/pct.h"
@@ -82,6 +84,23 @@ AuxiliaryData MakeRecord(const IRasterReader& oSource, const IRasterReader& oTar
         oRecord.SetChannelDescription(oFrom.GetChannelDescription(n), n);
     }
     return oRecord;
+}
+
+// A table of the source itself is copied; the tag by which a channel names it would lead back to the source.
+void DropOwnReferences(AuxiliaryData& oRecord, const std::string& name)
+{
+    std::string file, layer;
+    unsigned int nNumber = 0;
+    for (unsigned int n = 1; n <= oRecord.GetChannelCount(); ++n)
+    {
+        MetadataMap oTags = oRecord.GetChanMetadata(n);
+        const auto oTag = oTags.find(detail::DEFAULT_PCT);
+        if (oTag == oTags.end() || !ParseRefMetadataTag(oTag->second, file, layer, nNumber) ||
+            !IsReferenceTo(file, name))
+            continue;
+        oTags.erase(oTag);
+        oRecord.SetChanMetadata(oTags, n);
+    }
 }
 
 void CopyPlace(const IRasterReader& oSource, IRasterWriter& oTarget, Losses& oLosses)
@@ -162,10 +181,13 @@ std::vector<std::string> CopyAllButPixels(const IRasterReader& oSource, IRasterW
     if (oSource.GetWidth() != oTarget.GetWidth() || oSource.GetHeight() != oTarget.GetHeight())
         throw krv::DataException("The images are of two sizes");
     Losses oLosses;
-    const AuxiliaryData oRecord = MakeRecord(oSource, oTarget);
+    AuxiliaryData oRecord = MakeRecord(oSource, oTarget);
     CopyPlace(oSource, oTarget, oLosses);
     if (IsInPlace(oSource))
+    {
         CopyTables(oSource, oTarget, oLosses);
+        DropOwnReferences(oRecord, FindFacet<IDataset>(oSource)->GetName());
+    }
     oLosses.Try("the metadata", [&] { oTarget.SetAuxiliaryData(oRecord); });
     // After the record, which may hold a model as text.
     if (IsInPlace(oSource))

@@ -28,7 +28,6 @@ function indent(line)
 # The name that a declaration without initialiser ends with.
 function declared(text)
 {
-    sub(/alignas\([^)]*\) */, "", text);
     while (gsub(/<[^<>]*>/, "", text))
         ;
     sub(/ *(=|\{).*$/, "", text);
@@ -59,13 +58,15 @@ FNR == 1 { depth = 0; pending = 0; ++files }
 
 /^ *\/\// || /^#/ || /^$/ { next }
 
+{ sub(/alignas\([^)]*\) */, "") }
+
 # The head of a type, which may be of several lines; the brace stands alone below it.
 /^ *(template <.*> *)?(class|struct|enum|enum class|union) [^;]*$/ && !/[({]/ || /^ *(class|struct) [A-Za-z_0-9 ]*( final)?( : .*)?$/ {
     head = $0;
     sub(/^ *(template <.*> *)?/, "", head);
     pendingKind = head ~ /^enum/ ? "enum" : head ~ /^class/ ? "class" : "struct";
     sub(/^(enum class|enum|class|struct|union) */, "", head);
-    sub(/^(alignas\([^)]*\)|KRV_[A-Z_]*API|\[\[[^\]]*\]\]) */, "", head);
+    sub(/^(KRV_[A-Z_]*API|\[\[[^\]]*\]\]) */, "", head);
     pendingName = match(head, /^[A-Za-z_0-9:]+/) ? substr(head, 1, RLENGTH) : "";
     sub(/^.*::/, "", pendingName);
     pendingIndent = indent($0);

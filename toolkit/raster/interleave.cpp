@@ -133,7 +133,11 @@ template <std::size_t nBytes>
 using Unsigned =
     std::conditional_t<nBytes == 2, std::uint16_t, std::conditional_t<nBytes == 4, std::uint32_t, std::uint64_t>>;
 
-// 16 / sizeof(T) pixels of four channels.
+// 16 / sizeof(T) pixels of four channels, by two rounds of mixing: single samples, then pairs of them.
+//     a  a0 a1 a2 a3 ..     a0 b0 a1 b1 ..
+//     b  b0 b1 b2 b3 ..     c0 d0 c1 d1 ..     a0 b0 c0 d0 a1 b1 c1 d1 ..   vectors 0 and 1
+//     c  c0 c1 c2 c3 ..  >  a8 b8 a9 b9 ..  >  a8 b8 c8 d8 a9 b9 c9 d9 ..   vectors 2 and 3
+//     d  d0 d1 d2 d3 ..     c8 d8 c9 d9 ..     (of bytes; wider samples have fewer lanes)
 template <typename T>
 struct Quads
 {
@@ -162,7 +166,11 @@ void MixTwo(const unsigned char* const* planes, std::size_t nOffset, unsigned ch
     StoreVector(destination + 16, MixHigh<T>(a, b));
 }
 
-// What plane nPlane gives to vector nVector of three-channel pixels.
+// What plane nPlane gives to vector nVector of three-channel pixels. Each of the three vectors is put together from one
+// shuffle of each plane, with zeros where the others come:
+//     plane 0   a0 .  .  a1 .  .  a2 ..
+//     plane 1   .  b0 .  .  b1 .  .  ..    or    a0 b0 c0 a1 b1 c1 a2 ..
+//     plane 2   .  .  c0 .  .  c1 .  ..
 template <typename T, std::size_t nVector, std::size_t nPlane>
 inline constexpr simd::Shuffle THIRD = simd::Shuffle::Make(
     [](std::size_t i)

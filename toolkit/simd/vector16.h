@@ -78,23 +78,23 @@ inline Vector MixHigh(Vector oFirst, Vector oSecond)
         return _mm_unpackhi_epi64(oFirst, oSecond);
 }
 
-// Byte i of a shuffled vector is byte maIndices[i] of what it was, or 0 for 0x80.
+// Byte i of a shuffled vector is byte moIndices[i] of what it was, or 0 for 0x80.
 struct alignas(16) Shuffle
 {
-    unsigned char maIndices[16];
+    unsigned char moIndices[16];
 
     template <typename Index>
     static constexpr Shuffle Make(Index oIndex)
     {
         Shuffle oShuffle{};
         for (std::size_t i = 0; i < 16; ++i)
-            oShuffle.maIndices[i] = static_cast<unsigned char>(oIndex(i));
+            oShuffle.moIndices[i] = static_cast<unsigned char>(oIndex(i));
         return oShuffle;
     }
 
     Vector operator()(Vector oValue) const
     {
-        return _mm_shuffle_epi8(oValue, _mm_load_si128(reinterpret_cast<const __m128i*>(maIndices)));
+        return _mm_shuffle_epi8(oValue, _mm_load_si128(reinterpret_cast<const __m128i*>(moIndices)));
     }
 };
 

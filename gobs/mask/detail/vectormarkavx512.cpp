@@ -14,7 +14,10 @@
 // Words stay in registers only when these short loops are unrolled.
 #define KRV_UNROLL _Pragma("GCC unroll 8")
 
-// A comparison gives a bit for each sample here, so 64 samples make a word.
+// A comparison gives a bit for each sample here, so 64 samples make a word. Of two channels:
+//     bits    a0 b0 a1 b1 ..   which samples equal their values
+//     bytes   FF 00 FF FF ..   xor what is expected, and what is used: 0 where the rule is kept
+//     pixels  0     1     ..   a bit for each pixel whose two bytes are all zero
 namespace krv::gobs::detail
 {
 

@@ -10,6 +10,13 @@
 // The vectors of a group stay in registers only when these short loops are unrolled, at every optimisation level.
 #define KRV_UNROLL _Pragma("GCC unroll 16")
 
+// Pixels are compared with the pattern of their values sixteen at a time, so that pattern and vectors end together
+// whatever the number of channels N. Here two channels of 8 bits, 16 pixels in two vectors:
+//     samples  a0 b0 a1 b1 .. a7 b7 | a8 b8 .. a15 b15
+//     values   A  B  A  B  .. A  B  | A  B  .. A   B
+//     equal    FF 00 FF FF .. 00 00 | ..                 a byte of all ones for each sample that matches
+//     pixels   xor what is expected, and what is used: a pixel whose N bytes are all zero gets its bit
+//
 // Everything here depends on the kind of vector: a wide instantiation never stands in for a narrow one.
 namespace krv::gobs::detail
 {

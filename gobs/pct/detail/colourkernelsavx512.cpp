@@ -14,7 +14,11 @@ namespace krv::gobs::detail
 namespace
 {
 
-// The 256 values of one part of the colours.
+// The 256 values of one part of the colours, in four registers, found for 64 indices at once. An instruction picks from
+// two of them by the lower seven bits of an index; the eighth bit chooses between two such results.
+//     index       00..3F      40..7F      80..BF      C0..FF
+//     found in    quarters 0 and 1: low   quarters 2 and 3: high
+//     result      low where the highest bit of the index is clear, else high
 struct PartList
 {
     PartList(const Colour* pList, std::size_t nPart)

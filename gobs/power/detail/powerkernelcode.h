@@ -20,6 +20,9 @@ template <typename T>
 using PowerOf = std::conditional_t<std::is_same_v<T, float> || sizeof(T) <= 2, float, double>;
 
 // One complex value a pixel: the bulk of what there is.
+//     samples   re0 im0 re1 im1 re2 im2 ..
+//     squares   re0*re0 im0*im0 re1*re1 im1*im1 ..   in lanes twice as wide (of 16 bits)
+//     power     re0*re0 + im0*im0, re1*re1 + im1*im1, ..
 template <typename T>
 inline void SquarePairs(const T* p, std::size_t nPixels, PowerOf<T>* pPower)
 {

@@ -28,6 +28,8 @@ constexpr std::size_t VECTOR_BYTES = 32;
 #else
 constexpr std::size_t VECTOR_BYTES = 16;
 #endif
+// Bytes. Rows of 1536 bytes in memory, AVX2: 6.5 GB/s without fetching, 18.5 at 1024 bytes ahead, 23 at 4096, 25 at
+// 8192, 24 at 16384, 22 at 32768.
 constexpr std::size_t FETCHED_AHEAD = 8192;
 constexpr std::size_t FETCHED_LINE = 64;
 
@@ -104,7 +106,10 @@ inline void Store(T* p, Vector<T, LANES> oValues)
 }
 
 // Sums of pixels two by two of two rows of bytes by one instruction that adds neighbours; up to 32 bytes of vector,
-// what is wider has the better way of its own. Pixels of three bytes fill three quarters of the lanes.
+// what is wider has the better way of its own. Pixels of three bytes fill three quarters of the lanes:
+//     bytes of a row     r0 g0 b0 r1 g1 b1 r2 g2 b2 r3 g3 b3  .  .  .  .
+//     beside each other  r0 r1 g0 g1 b0 b1 r2 r3 g2 g3 b2 b3  -  -  -  -
+//     words              r0+r1 g0+g1 b0+b1 r2+r3 g2+g3 b2+b3  0     0        plus those of the second row
 template <unsigned int N, std::size_t LANES>
 constexpr bool HAS_BYTE_SUMS = false;
 #if defined(__SSE4_1__)
@@ -178,6 +183,10 @@ struct Reduction
     static constexpr bool FIRST = std::is_same_v<In, Mean>;
     static constexpr std::size_t MOST_LANES = VECTOR_BYTES / sizeof(Sum) < 4 ? 4 : VECTOR_BYTES / sizeof(Sum);
 
+    // Of types without such an instruction both rows are added first, then left and right samples are picked out of
+    // the two vectors (here of two samples a pixel):
+    //     both rows  x0 y0 x1 y1 | x2 y2 x3 y3
+    //     left       x0 y0 x2 y2     right  x1 y1 x3 y3     sums  x0+x1 y0+y1 x2+x3 y2+y3
     // One vector of sums at a time, of which pixels of three samples fill three quarters. Nothing is read or written
     // beyond what is named.
     template <std::size_t LANES>

@@ -2,7 +2,11 @@
 
 // The inner loops of interpolation. One source file for each instruction set includes this and is compiled with options
 // of its own, so everything here is local to the file and calls nothing that is not. The samples of a pixel, or the
-// four pixels of a row, lie in the lanes of a vector of four.
+// four pixels of a row, lie in the lanes of a vector of four:
+//     lane              0    1    2    3
+//     pixel of 4        r    g    b    a
+//     pixel of 3        r    g    b    -     the next pixel is written over the last lane
+//     cubic, pixel of 1 p-1  p0   p1   p2    times four weights, then summed across
 
 #include "gobs/resampling/detail/plainkernels.h"
 
@@ -23,6 +27,8 @@ namespace
 typedef float Floats __attribute__((vector_size(16)));      // NOLINT: an attribute of the typedef
 typedef std::int32_t Ints __attribute__((vector_size(16))); // NOLINT
 
+// Places that are split into pixels and fractions at a time, on the stack. Measured with AVX2: blocks of 16 cost up to
+// a sixth more, all from 64 to 1024 the same.
 constexpr std::size_t BLOCK = 128;
 
 inline Floats Spread(float n)

@@ -207,7 +207,7 @@ std::size_t ReverseVectors(const unsigned char* source, unsigned char* destinati
 {
     static constexpr Shuffle TURNED =
         Shuffle::Make([](std::size_t i) { return (i & 1) << 3 | (i & 2) << 1 | (i & 4) >> 1 | (i & 8) >> 3; });
-    const Vector oTurned = LoadVector(TURNED.maIndices);
+    const Vector oTurned = LoadVector(TURNED.moIndices);
     const Vector oLowBits = _mm_set1_epi8(15);
     std::size_t i = 0;
     for (; i + 16 <= nBytes; i += 16)
@@ -266,7 +266,10 @@ std::uint64_t SpreadBits(unsigned char nBits)
     return (nApart + 0x7F7F7F7F7F7F7F7FU) >> 7 & 0x0101010101010101U;
 }
 
-// A row of pixels of one bit, of which nBytes bytes can be read.
+// A row of pixels of one bit, of which nBytes bytes can be read. Sixteen bytes of it become eight vectors:
+//     byte k twice eight times   b0 b0 b0 b0 b0 b0 b0 b0 b1 b1 ..
+//     and                        80 40 20 10 08 04 02 01 80 40 ..
+//     at most one                1 or 0 in each byte
 void UnpackSingleBits(const unsigned char* source, std::size_t nBytes, unsigned char* destination, std::size_t nSamples)
 {
     const std::size_t nWhole = std::min(nBytes, nSamples / 8);
@@ -279,7 +282,7 @@ void UnpackSingleBits(const unsigned char* source, std::size_t nBytes, unsigned 
     for (; i + 16 <= nWhole; i += 16)
     {
         const Vector oBytes = LoadVector(source + i);
-        Vector oPlaces = LoadVector(FIRST.maIndices);
+        Vector oPlaces = LoadVector(FIRST.moIndices);
         for (std::size_t k = 0; k < 8; ++k, oPlaces = _mm_add_epi8(oPlaces, oTwo))
             StoreVector(destination + i * 8 + k * 16,
                         _mm_min_epu8(_mm_and_si128(_mm_shuffle_epi8(oBytes, oPlaces), oBits), oOne));

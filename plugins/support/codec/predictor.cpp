@@ -67,7 +67,10 @@ Vector LoadSamples(const unsigned char* source)
     return bSwap ? simd::SwapVector<T>(oValue) : oValue;
 }
 
-// Running sums within one vector, by adding it to itself shifted by one, two, four ... pixels.
+// Running sums within one vector, by adding it to itself shifted by one, two, four ... pixels:
+//     differences   d0 d1    d2       d3          ..
+//     by one        d0 d0+d1 d1+d2    d2+d3       ..
+//     by two        d0 d0+d1 d0+d1+d2 d0+d1+d2+d3 ..
 template <typename T, std::size_t nStride>
 Vector Accumulate(Vector oValue)
 {

@@ -3,13 +3,11 @@
 #include "datasources/datasets/memorydataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/overviews/overviewbuilder.h"
-#include "datasources/reader/exacthaloreader.h"
 #include "datasources/reader/validitysource.h"
 #include "datasources/writer/basicwriter.h"
 #include "gobs/mask/mask.h"
 #include "gobs/raster/buffertype.h"
 #include "tests/datasources/reader/readertest.h"
-#include "tests/support/facts.h"
 #include "tests/support/outputcapture.h"
 #include "toolkit/ogc/cs/crsfactory.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
@@ -18,7 +16,6 @@
 #include <cmath>
 #include <complex>
 #include <cstring>
-#include <filesystem>
 
 namespace krv::test
 {
@@ -383,44 +380,6 @@ TEST_F(MetaComplexFiles, FailuresLeaveNothing)
     moModel->moLevels = {2};
     for (const auto& oOperation : OPERATIONS)
         FailAtEveryCall(oOperation, [] {});
-}
-
-// A real scene taken apart into I and Q, and put together again: pixels, margins and levels.
-TEST(MetaComplexDataset, TheScenePutTogetherIsTheScene)
-{
-    const std::string file = DataFolder() + "/sar/slc.tif";
-    if (!std::filesystem::exists(file))
-        GTEST_SKIP() << "no real files";
-    FormatHome oHome;
-    oHome.Add(std::string(KRV_TEST_HOME) + "/lib/qrfformats/tif.so");
-    BasicReader oScene(file);
-    const std::string pixels = ReadPixels(oScene);
-    const auto oValues = ValuesOf<std::int16_t>(pixels);
-    std::vector<std::int16_t> oParts[2];
-    for (std::size_t n = 0; n < oValues.size(); ++n)
-        oParts[n % 2].push_back(oValues[n]);
-    MemoryDataset oI, oQ;
-    for (const auto& [poSource, nPart] : {std::pair{&oI, 0}, {&oQ, 1}})
-    {
-        poSource->Create(oScene.GetWidth(), oScene.GetHeight(), {gobs::eDT_16S});
-        WriteAll(poSource->GetRasterIO({1}), BytesOf(oParts[nPart]));
-    }
-    MetaComplexDataset oPairs(&oI, &oQ, {{1, 1}}, false);
-    IDataset& oRoot = oPairs;
-    ExactHaloReader oTogether(new BasicReader(&oRoot, {}, false), true), oAlone(new BasicReader(file), true);
-    EXPECT_EQ(oTogether.GetDataType(), oScene.GetDataType());
-    EXPECT_EQ(ReadPixels(oTogether), pixels);
-    for (IRasterReader* const poReader :
-         {static_cast<IRasterReader*>(&oTogether), static_cast<IRasterReader*>(&oAlone)})
-    {
-        poReader->SetTileSize(170, 90);
-        poReader->SetMargins(7, 5, eMirror);
-    }
-    for (unsigned int nTile = 0; nTile < oAlone.GetTileCount(); ++nTile)
-    {
-        const RasterPtr oFirst(oTogether.GetRaster(nTile)), oSecond(oAlone.GetRaster(nTile));
-        ASSERT_EQ(PixelsOf(*oFirst), PixelsOf(*oSecond)) << nTile;
-    }
 }
 
 } // namespace krv::test

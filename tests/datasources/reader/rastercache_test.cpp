@@ -1,7 +1,6 @@
 #include "datasources/reader/derived/rastercache.h"
 
 #include "datasources/reader/derived/transformrasterreader.h"
-#include "datasources/reader/exacthaloreader.h"
 #include "datasources/reader/multitypereader.h"
 #include "datasources/reader/readervalidity.h"
 #include "gobs/mask/mask.h"
@@ -69,42 +68,6 @@ void ExpectSame(IRasterReader& oFound, IRasterReader& oExpected, unsigned int nS
 }
 
 } // namespace
-
-TEST_F(RasterCacheTest, AnswersAreThoseOfTheSource)
-{
-    moModel->moLevels = {2};
-    for (const unsigned int nTile : {0u, 5u, 16u, 100u})
-    {
-        MultiTypeReader oPlain(moFile, {1, 2, 3}), oSource(moFile, {1, 2, 3});
-        RasterCache oCache(&oSource, false, {nTile, nTile});
-        EXPECT_EQ(oCache.GetTileWidth(), oPlain.GetTileWidth());
-        EXPECT_EQ(oCache.GetTileCount(), oPlain.GetTileCount());
-        EXPECT_EQ(oCache.GetAuxiliaryData().GetChanMetadataValue("band", 2), "b2");
-        EXPECT_EQ(oCache.GetChannelsInfo().size(), 3u);
-        ExpectSame(oCache, oPlain, nTile);
-        EXPECT_GT(oCache.GetStatistics().mnHits, 0u);
-        EXPECT_NE(Error([&] { oCache.SetMargins(60, 0, eMirror); }), "");
-        EXPECT_EQ(oCache.GetMarginBehaviour(), eMirror);
-
-        const std::unique_ptr<IOverviewReaderAccessor> oLevels(oCache.GetOverviewReaderAccessor());
-        const std::unique_ptr<IOverviewReaderAccessor> oPlainLevels(oPlain.GetOverviewReaderAccessor());
-        const std::unique_ptr<IRasterReader> oLevel(oLevels->CreateRasterReader(2));
-        const std::unique_ptr<IRasterReader> oPlainLevel(oPlainLevels->CreateRasterReader(2));
-        ExpectSame(*oLevel, *oPlainLevel, nTile);
-    }
-    // With exact margins, and over a reader that has them itself.
-    moModel->moBitmaps.clear();
-    moModel->moAuxiliary.SetFileMetadataValue("NO_DATA_VALUE", "7");
-    BasicReader oSource(moFile, {1});
-    ExactHaloReader oExact(&oSource, false);
-    BasicReader oOther(moFile, {1});
-    RasterCache oCache(&oOther, false, {7, 9, 0, true});
-    ExpectSame(oCache, oExact, 3);
-    RasterCache oOverExact(&oExact, false, {7, 9});
-    BasicReader oThird(moFile, {1});
-    ExactHaloReader oSame(&oThird, false);
-    ExpectSame(oOverExact, oSame, 4);
-}
 
 TEST_F(RasterCacheTest, FrontsShareTilesAndChangesAreForgotten)
 {

@@ -7,12 +7,9 @@
 #include "gobs/mask/mask.h"
 #include "gobs/raster/rasterview.h"
 #include "tests/datasources/reader/readertest.h"
-#include "tests/support/facts.h"
 #include "tests/support/memoryreader.h"
 
 #include <cmath>
-#include <fstream>
-#include <sstream>
 
 namespace krv::test
 {
@@ -317,46 +314,6 @@ TEST_F(TotalPowerRasterReaderTest, NothingLeaksAtTheNthCall)
     FailAtEveryCall(OverFile, [] {});
     FailAtEveryCall(OverDataset, [] {});
     FailAtEveryCall(OverReader, [] {});
-}
-
-// A whole coherency matrix of a real scene: the power is the trace, and never below 0.
-TEST(TotalPowerRasterReaderFiles, TheTraceOfARealCoherencyMatrix)
-{
-    const std::vector<std::string> NAMES = {"T11", "T12_real", "T12_imag", "T13_real", "T13_imag",
-                                            "T22", "T23_real", "T23_imag", "T33"};
-    std::vector<std::string> oPlanes;
-    for (const std::string& name : NAMES)
-    {
-        std::ifstream oFile(DataFolder() + "/sar/PST/T3/" + name + ".bin", std::ios::binary);
-        if (!oFile)
-            GTEST_SKIP() << "the scene is not there";
-        std::ostringstream oText;
-        oText << oFile.rdbuf();
-        oPlanes.push_back(oText.str());
-    }
-    const std::size_t nPixels = oPlanes.front().size() / sizeof(float);
-    ASSERT_EQ(nPixels, 101u * 201);
-    std::string pixels;
-    for (std::size_t n = 0; n < nPixels; ++n)
-        for (const std::string& plane : oPlanes)
-            pixels.append(plane, n * sizeof(float), sizeof(float));
-    const auto poModel = std::make_shared<ImageModel>();
-    poModel->moTypes.assign(9, eDT_32R);
-    poModel->moAuxiliary = AuxiliaryData(9);
-    poModel->moAuxiliary.SetFileMetadataValue("Matrix_Type", "T3");
-    SyntheticDataset oDataset(poModel);
-    MemoryReader oSource(oDataset, 101, 201, {1, 2, 3, 4, 5, 6, 7, 8, 9}, eDT_32R, pixels);
-    TotalPowerRasterReader oPower(&oSource, false);
-    const RasterPtr oRaster(oPower.ReadRaster(0, 0, 101, 201));
-    const auto At = [&](std::size_t nPlane, std::size_t n)
-    {
-        return static_cast<double>(reinterpret_cast<const float*>(oPlanes[nPlane].data())[n]);
-    };
-    std::vector<double> oTrace;
-    for (std::size_t n = 0; n < nPixels; ++n)
-        oTrace.push_back(At(0, n) + At(5, n) + At(8, n));
-    ExpectEqual(ValuesOf(*oRaster), oTrace, false);
-    EXPECT_GE(*std::min_element(oTrace.begin(), oTrace.end()), 0);
 }
 
 } // namespace krv::test

@@ -138,6 +138,9 @@ TEST_F(OpenTest, AColourTableIsCopiedOrNamedAsLost)
     {
         const auto poDataset = Open(MakeScene("index.tif"), eUpdate);
         dynamic_cast<datasources::IPCTDataset&>(*poDataset).CreatePCT(PCT::FromColours({{1, 2, 3}, {4, 5, 6}}), 1);
+        AuxiliaryData oRecord(1);
+        oRecord.SetChanMetadataValue("DEFAULT_PCT_REF", "gdb:index.tif/{PCT:1}", 1);
+        poDataset->WriteAuxiliaryData(oRecord);
         poDataset->Synchronize();
     }
     const auto poSource = OpenReader(Name("index.tif"));
@@ -146,6 +149,7 @@ TEST_F(OpenTest, AColourTableIsCopiedOrNamedAsLost)
     poSame->Synchronize();
     const auto poCopy = Open(Name("same.tif"));
     EXPECT_EQ(dynamic_cast<datasources::IPCTDataset&>(*poCopy).GetPCTList().size(), 1u);
+    EXPECT_EQ(poCopy->ReadAuxiliaryData().GetChanMetadataValue("DEFAULT_PCT_REF", 1), "") << "leads to the source";
     const auto poReal = CreateWriter(Name("real.tif"), RasterInfo(64, 48, 1, eDT_32R));
     EXPECT_THAT(CopyAllButPixels(*poSource, *poReal),
                 ::testing::ElementsAre(::testing::StartsWith("colour table 1 is not kept: ")));

@@ -48,7 +48,7 @@ void Shard::Unlist(Entry& oEntry)
 void Shard::NoteOldest(std::size_t nList)
 {
     const Entry* const poOldest = moLists[nList].GetOldest();
-    maOldest[nList].store(poOldest == nullptr ? NOTHING : poOldest->mnStamp, std::memory_order_relaxed);
+    moOldest[nList].store(poOldest == nullptr ? NOTHING : poOldest->mnStamp, std::memory_order_relaxed);
 }
 
 } // namespace krv::cache::detail

@@ -55,7 +55,7 @@ struct alignas(64) Shard
     std::uint64_t mnEvictions = 0;
     std::condition_variable moDone;
     // The stamps at the old ends of the lists, for whoever looks for the oldest entry of all.
-    std::array<std::atomic<std::uint64_t>, 2> maOldest{NOTHING, NOTHING};
+    std::array<std::atomic<std::uint64_t>, 2> moOldest{NOTHING, NOTHING};
 
     Entry* Find(const TileKey& oKey) const;
     void Insert(const TileKey& oKey, Entry& oEntry);

@@ -329,7 +329,7 @@ bool Store::EvictOne(Entry* poTaker)
         std::size_t nAt = 0;
         for (std::size_t nList = 0; nList < 2 * SHARDS; ++nList)
         {
-            std::uint64_t nStamp = moShards[nList / 2].maOldest[nList % 2].load(std::memory_order_relaxed);
+            std::uint64_t nStamp = moShards[nList / 2].moOldest[nList % 2].load(std::memory_order_relaxed);
             if (nStamp == Shard::NOTHING || oTried[nList])
                 continue;
             if (nStamp != Entry::RETIRED && (nList % 2 == Shard::eReduced) != bFrames)

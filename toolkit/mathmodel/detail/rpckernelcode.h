@@ -10,7 +10,10 @@
 // The arithmetic of rational polynomials as plain loops over blocks of points, which the compiler makes vectors of.
 // Every source file that includes this is compiled for another instruction set, so nothing here is shared between them:
 // it all lies in an unnamed namespace. A block is filled up to whole vectors, so that a point is computed in the same
-// way wherever it stands.
+// way wherever it stands:
+//     longitudes  l0 l1 l2 l3 | l4 l5 l0 l0     six points in lanes of four; the last two say again what the first is
+//     latitudes   p0 p1 p2 p3 | p4 p5 p0 p0
+//     columns     c0 c1 c2 c3 | c4 c5 -  -      all 80 coefficients are the same for every lane
 
 namespace krv::mathmodel::detail
 {

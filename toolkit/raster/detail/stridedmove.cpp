@@ -39,7 +39,9 @@ void Move(const unsigned char* pSource, std::size_t nSourceStride, unsigned char
 constexpr unsigned char NOTHING = 0x80; // for a byte shuffle: 0 here
 
 // Takes every STEP-th value of N bytes out of a row: a full vector of them lies in STEP vectors of the source, each of
-// which gives its part by a byte shuffle.
+// which gives its part by a byte shuffle. For N = 4 and STEP = 3:
+//     source   a0 b0 c0 a1 | b1 c1 a2 b2 | c2 a3 b3 c3
+//     parts    a0 a1 .  .  | .  .  a2 .  | .  .  .  a3     or     a0 a1 a2 a3
 template <std::size_t N, std::size_t STEP>
 class Gatherer
 {
