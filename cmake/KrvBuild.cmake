@@ -120,6 +120,25 @@ function(krv_add_test name)
   gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT 600)
 endfunction()
 
+# krv_vector_options(SOURCES s... OPTIONS o... AVX2 o... AVX512 o...): how sources of loops are compiled: with the options,
+# and those whose names end in avx2 or avx512 for the processors that toolkit/simd/processor.h says have these, with more
+# options of their own.
+function(krv_vector_options)
+  cmake_parse_arguments(ARG "" "" "SOURCES;OPTIONS;AVX2;AVX512" ${ARGN})
+  foreach(source IN LISTS ARG_SOURCES)
+    set(options ${ARG_OPTIONS})
+    if(NOT CMAKE_SYSTEM_PROCESSOR MATCHES "x86_64|amd64|AMD64")
+    elseif(source MATCHES "avx2\\.cpp$")
+      list(APPEND options -mavx2 ${ARG_AVX2})
+    elseif(source MATCHES "avx512\\.cpp$")
+      # GCC 12 takes the undefined operands in its own headers for mistakes.
+      list(APPEND options -mavx512f -mavx512bw -mavx512dq -mavx512vl -mavx512vbmi ${ARG_AVX512}
+                          $<$<CXX_COMPILER_ID:GNU>:-Wno-uninitialized> $<$<CXX_COMPILER_ID:GNU>:-Wno-maybe-uninitialized>)
+    endif()
+    set_source_files_properties(${source} PROPERTIES COMPILE_OPTIONS "${options}")
+  endforeach()
+endfunction()
+
 # krv_vector_kernels(VARIABLE STEM): the source files of inner loops that are compiled for each instruction set, with the
 # options that they want: gobs/STEM.cpp, STEMavx2.cpp and STEMavx512.cpp. These hold for the folder that calls this: the
 # loops are no part of a library's interface, whoever wants them compiles them in. Results do not depend on the
@@ -127,14 +146,8 @@ endfunction()
 function(krv_vector_kernels variable stem)
   set(stem ${CMAKE_SOURCE_DIR}/gobs/${stem})
   set(sources ${stem}.cpp ${stem}avx2.cpp ${stem}avx512.cpp)
-  set_source_files_properties(${sources} PROPERTIES COMPILE_OPTIONS
-    "-O3;-fno-math-errno;-fno-trapping-math;-ffp-contract=off;-Wno-psabi")
-  # The library asks the processor before it calls the wide ones.
-  if(CMAKE_SYSTEM_PROCESSOR MATCHES "x86_64|amd64|AMD64")
-    set_property(SOURCE ${stem}avx2.cpp APPEND PROPERTY COMPILE_OPTIONS -mavx2)
-    set_property(SOURCE ${stem}avx512.cpp APPEND PROPERTY
-      COMPILE_OPTIONS -mavx512f -mavx512bw -mavx512dq -mavx512vl -mavx512vbmi)
-  endif()
+  krv_vector_options(SOURCES ${sources}
+    OPTIONS -O3 -fno-math-errno -fno-trapping-math -ffp-contract=off -Wno-psabi)
   set(${variable} ${sources} PARENT_SCOPE)
 endfunction()
 

@@ -244,7 +244,8 @@ bool HasLevels(const SourceFile& oSource)
     return poLevels != nullptr && !poLevels->GetLevels().empty();
 }
 
-void ConvertPower(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress)
+void ConvertPower(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress,
+                  krv::threading::IExecutor* poExecutor)
 {
     if (oRequest.sources.size() != 1 || oRequest.type || oRequest.promote)
         throw RequestException("the power is that of one file, and has a type of its own");
@@ -258,8 +259,13 @@ void ConvertPower(const CopyRequest& oRequest, const TargetForm& oForm, const Pr
         std::uint64_t{oWindow.y} + oWindow.height > oReader.GetHeight())
         throw RequestException(fmt::format("{}: the window is not inside the image of {} x {} pixels",
                                            oSource.GetName(), oReader.GetWidth(), oReader.GetHeight()));
-    const Target oTarget(TargetLayout{oWindow.width, oWindow.height, {oReader.GetDataType()}}, oForm, oProgress);
-    StoreReader(oReader, oWindow, oTarget, "convert");
+    const Target oTarget(TargetLayout{oWindow.width, oWindow.height, {oReader.GetDataType()}}, oForm, oProgress,
+                         poExecutor);
+    const auto Open = [&oPower](const SourceFile& oFile)
+    {
+        return std::make_shared<TotalPowerRasterReader>(&oFile.GetDataset(), false, oPower);
+    };
+    StoreReaders(oSource, {{Open, {1}}}, oWindow, oTarget, "convert");
 }
 
 } // namespace
@@ -269,7 +275,7 @@ void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progres
 {
     CheckTarget(oRequest.sources, oForm.name);
     if (oRequest.power)
-        return ConvertPower(oRequest, oForm, oProgress);
+        return ConvertPower(oRequest, oForm, oProgress, poExecutor);
     const CopyPlan oPlan(oRequest);
     WarnOfFurtherImages(oPlan);
     const Target oTarget(oPlan, oForm, oProgress, poExecutor);

@@ -2,7 +2,6 @@
 
 #include "datasources/reader/derived/totalpowerrasterreader.h"
 #include "datasources/reader/irasterreader.h"
-#include "datasources/reader/rasterrange.h"
 #include "datasources/reader/validitysource.h"
 #include "gobs/mask/mask.h"
 #include "gobs/mask/samplematch.h"
@@ -483,25 +482,13 @@ std::unique_ptr<ValiditySource> FindValidity(const SourceFile& oFile, const std:
     return poSource->HasBitmap() || poSource->HasAlpha() || bPixels ? std::move(poSource) : nullptr;
 }
 
-// One result per channel of a group, which are all of one type. Tiles are gathered each for itself and merged in their
-// order, so that sums of reals come out the same whoever gathers them.
-std::vector<ChannelStatistics> StatisticsOf(const SourceFile& oFile, const std::vector<unsigned int>& oChannels,
-                                            bool bRaw, const Progress& oProgress, krv::threading::IExecutor* poExecutor)
+// One result per channel of what the workers read; oReader is as theirs are. Tiles are gathered each for itself and
+// merged in their order, so that sums of reals come out the same whoever gathers them.
+std::vector<ChannelStatistics> GatherTiles(FileWorkers<Worker>& oWorkers,
+                                           const krv::datasources::IRasterReader& oReader,
+                                           const std::vector<OptionalNoData>& oNoData, const Progress& oProgress,
+                                           krv::threading::IExecutor* poExecutor)
 {
-    std::vector<OptionalNoData> oNoData;
-    for (const unsigned int nChannel : oChannels)
-        oNoData.push_back(oFile.GetNoData(nChannel));
-    FileWorkers<Worker> oWorkers(oFile,
-                                 [&](FilePointer poFile)
-                                 {
-                                     LevelReader oReader = poFile->Read(oChannels);
-                                     oReader.Get().SetMargins(0, 0, eMirror);
-                                     auto poValidity = bRaw ? nullptr : FindValidity(*poFile, oChannels);
-                                     return std::make_unique<Worker>(std::move(poFile), std::move(oReader),
-                                                                     std::move(poValidity));
-                                 });
-    const LevelReader oWhole = oFile.Read(oChannels);
-    const krv::datasources::IRasterReader& oReader = oWhole.Get();
     const Gatherers oTotal = MakeGatherers(oReader.GetDataType(), oNoData);
     ProgressCounter oCounter(oProgress, "stats",
                              krv::gobs::BufferBytes(oReader.GetWidth(), oReader.GetHeight(), oReader.GetChansCount(),
@@ -526,26 +513,48 @@ std::vector<ChannelStatistics> StatisticsOf(const SourceFile& oFile, const std::
     return oResults;
 }
 
+// Of channels of one type.
+std::vector<ChannelStatistics> StatisticsOf(const SourceFile& oFile, const std::vector<unsigned int>& oChannels,
+                                            bool bRaw, const Progress& oProgress, krv::threading::IExecutor* poExecutor)
+{
+    std::vector<OptionalNoData> oNoData;
+    for (const unsigned int nChannel : oChannels)
+        oNoData.push_back(oFile.GetNoData(nChannel));
+    FileWorkers<Worker> oWorkers(oFile,
+                                 [&](FilePointer poFile)
+                                 {
+                                     LevelReader oReader = poFile->Read(oChannels);
+                                     oReader.Get().SetMargins(0, 0, eMirror);
+                                     auto poValidity = bRaw ? nullptr : FindValidity(*poFile, oChannels);
+                                     return std::make_unique<Worker>(std::move(poFile), std::move(oReader),
+                                                                     std::move(poValidity));
+                                 });
+    const LevelReader oWhole = oFile.Read(oChannels);
+    return GatherTiles(oWorkers, oWhole.Get(), oNoData, oProgress, poExecutor);
+}
+
 // Pixels that are not valid are NaN, which is the no-data value.
 std::vector<ChannelStatistics> PowerStatistics(const SourceFile& oFile, const StatisticsRequest& oRequest,
-                                               const Progress& oProgress)
+                                               const Progress& oProgress, krv::threading::IExecutor* poExecutor)
 {
     krv::datasources::PowerRequest oPower;
     oPower.moChannels = oRequest.channels.empty() ? oRequest.channels : oFile.CheckChannels(oRequest.channels);
-    krv::datasources::TotalPowerRasterReader oReader(&oFile.GetDataset(), false, oPower);
-    const std::string noData = krv::datasources::GetNoDataText(oReader.GetAuxiliaryData(), 1);
-    const auto poGatherer = StatisticsGatherer::Make(oReader.GetDataType(), krv::datasources::ParseNoData(noData));
-    ProgressCounter oCounter(oProgress, "stats",
-                             krv::gobs::BufferBytes(oReader.GetWidth(), oReader.GetHeight(), 1, oReader.GetDataType()));
-    for (const std::unique_ptr<krv::gobs::Raster> poTile : krv::datasources::RasterRange(oReader))
+    const auto Open = [&oPower](const SourceFile& oOpened)
     {
-        poGatherer->Add(poTile->GetBuffer(), std::uint64_t{poTile->GetWidth()} * poTile->GetHeight(), 1);
-        oCounter.Advance(poTile->GetBufferSize());
-    }
-    ChannelStatistics oResult = poGatherer->Get();
-    oResult.type = oReader.GetDataType();
-    oResult.noDataText = noData;
-    return {oResult};
+        return std::make_unique<krv::datasources::TotalPowerRasterReader>(&oOpened.GetDataset(), false, oPower);
+    };
+    FileWorkers<Worker> oWorkers(oFile,
+                                 [&Open](FilePointer poFile)
+                                 {
+                                     LevelReader oReader(Open(*poFile), nullptr, nullptr);
+                                     return std::make_unique<Worker>(std::move(poFile), std::move(oReader), nullptr);
+                                 });
+    const auto poReader = Open(oFile);
+    const std::string noData = krv::datasources::GetNoDataText(poReader->GetAuxiliaryData(), 1);
+    auto oResults = GatherTiles(oWorkers, *poReader, {krv::datasources::ParseNoData(noData)}, oProgress, poExecutor);
+    oResults.front().type = poReader->GetDataType();
+    oResults.front().noDataText = noData;
+    return oResults;
 }
 
 } // namespace
@@ -568,7 +577,7 @@ std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile, const 
                                                  const Progress& oProgress, krv::threading::IExecutor* poExecutor)
 {
     if (oRequest.power)
-        return PowerStatistics(oFile, oRequest, oProgress);
+        return PowerStatistics(oFile, oRequest, oProgress, poExecutor);
     const auto oChannels = oFile.CheckChannels(oRequest.channels);
     const unsigned int nAlpha = oRequest.raw ? 0 : krv::datasources::FindAlpha(oFile.GetMetadata());
     std::vector<ChannelStatistics> oResults(oChannels.size());

@@ -163,6 +163,18 @@ void CheckRequest(const WarpRequest& oRequest)
         throw RequestException("the grid of another file is taken as it is, without bounds, resolution and size");
 }
 
+// A reader and what it stands on.
+struct GridReader
+{
+    GridReader(LevelReader oSource, const std::shared_ptr<const IGridMap>& poMap, const TransformRequest& oRequest)
+        : source(std::move(oSource)), reader(&source.Get(), poMap, oRequest, false)
+    {
+    }
+
+    LevelReader source;
+    TransformRasterReader reader;
+};
+
 void KeepTable(const krv::gobs::PCT& oTable, const detail::Target& oTarget)
 {
     auto* const poTables = oTarget.Find<IPCTDataset>();
@@ -173,15 +185,13 @@ void KeepTable(const krv::gobs::PCT& oTable, const detail::Target& oTarget)
 
 } // namespace
 
-WarpResult Warp(const WarpRequest& oRequest, const TargetForm& oForm, const Progress& oProgress)
+WarpResult Warp(const WarpRequest& oRequest, const TargetForm& oForm, const Progress& oProgress,
+                krv::threading::IExecutor* poExecutor)
 {
     CheckRequest(oRequest);
     detail::CheckTarget({oRequest.source, oRequest.like}, oForm.name);
     const SourceFile oFile(oRequest.source);
     const auto oChannels = oFile.CheckChannels(oRequest.channels);
-    if (oFile.GroupByType(oChannels).size() > 1)
-        throw krv::DataException(oFile.GetName() +
-                                 ": its channels are of different types; choose some of one type with --channels");
     const Placement oPlacement = Place(oFile);
     const Grid oGrid =
         oRequest.like.empty() ? MakeGrid(oRequest, oFile, oPlacement.geocoding) : GridLike(oFile, oRequest.like);
@@ -211,13 +221,26 @@ WarpResult Warp(const WarpRequest& oRequest, const TargetForm& oForm, const Prog
         oResult.largestResidual = oFit.GetLargestResidual();
         poMap = std::make_shared<ControlPointMap>(oGrid, std::move(oFit));
     }
-    const LevelReader oSource = oFile.Read(oChannels);
-    TransformRasterReader oReader(&oSource.Get(), poMap, oTransform, false);
-    const std::vector<krv::gobs::DataType> oTypes(oChannels.size(), oReader.GetDataType());
-    const detail::Target oTarget(detail::TargetLayout{oGrid.width, oGrid.height, oTypes}, oForm, oProgress);
+    std::vector<krv::gobs::DataType> oTypes;
+    for (const unsigned int nChannel : oChannels)
+        oTypes.push_back(oFile.GetType(nChannel));
+    // Types are never promoted on the way: some promotions lose values.
+    std::vector<detail::StoredChannels> oStored;
+    for (const ChannelGroup& oGroup : oFile.GroupByType(oChannels))
+    {
+        const auto Open = [&, oGroup](const SourceFile& oOpened)
+        {
+            const auto poGridReader = std::make_shared<GridReader>(oOpened.Read(oGroup.channels), poMap, oTransform);
+            return std::shared_ptr<IRasterReader>(poGridReader, &poGridReader->reader);
+        };
+        oStored.push_back({Open, {}});
+        for (const std::size_t nPosition : oGroup.positions)
+            oStored.back().channels.push_back(static_cast<unsigned int>(nPosition) + 1);
+    }
+    const detail::Target oTarget(detail::TargetLayout{oGrid.width, oGrid.height, oTypes}, oForm, oProgress, poExecutor);
     if (poTable != nullptr)
         KeepTable(*poTable, oTarget);
-    detail::StoreReader(oReader, {0, 0, oGrid.width, oGrid.height}, oTarget, "warp");
+    detail::StoreReaders(oFile, oStored, {0, 0, oGrid.width, oGrid.height}, oTarget, "warp");
     return oResult;
 }
 

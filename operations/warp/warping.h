@@ -19,7 +19,7 @@ namespace krv::operations
 struct WarpRequest
 {
     std::string source;
-    std::vector<unsigned int> channels;          // of one type; empty: all
+    std::vector<unsigned int> channels;          // empty: all
     std::string like;                            // a file whose grid it is; nothing else is given then
     std::optional<MapBounds> bounds;             // of the outer edges; pixels at the far edges may reach beyond
     std::vector<double> resolution;              // map units of a pixel, of a column and of a row
@@ -47,9 +47,10 @@ struct WarpResult
 
 // Resamples a file into another grid of its reference system. A file without a transform that has ground control points
 // is placed by a polynomial through them. Colour tables stay with their channel where pixels are taken as they are. A
-// mask says which pixels are valid where no value does. The new file as with Convert. Throws RequestException for what
-// makes no sense and for a file in another reference system, DataException for channels of different types.
-KRV_OPERATIONS_API WarpResult Warp(const WarpRequest& oRequest, const TargetForm& oForm,
-                                   const Progress& oProgress = {});
+// mask says which pixels are valid where no value does. Each channel keeps its type. The new file as with Convert, the
+// same for any number of threads. Throws RequestException for what makes no sense and for a file in another reference
+// system.
+KRV_OPERATIONS_API WarpResult Warp(const WarpRequest& oRequest, const TargetForm& oForm, const Progress& oProgress = {},
+                                   krv::threading::IExecutor* poExecutor = nullptr);
 
 } // namespace krv::operations

@@ -1,4 +1,5 @@
 #include "toolkit/raster/detail/kernels.h"
+#include "toolkit/simd/processor.h"
 
 namespace krv::raster::detail
 {
@@ -6,7 +7,7 @@ namespace krv::raster::detail
 const Kernels& GetKernels()
 {
 #if defined(KRV_TESTS_Avx2) && defined(__x86_64__)
-    if (RunsAvx2())
+    if (simd::RunsAvx2())
         return GetAvx2Kernels();
 #endif
     return GetBaselineKernels();

@@ -1,6 +1,6 @@
 #include "toolkit/mathmodel/detail/rpckernels.h"
 
-#include "toolkit/raster/detail/kernels.h"
+#include "toolkit/simd/processor.h"
 
 #include <cmath>
 #include <random>
@@ -16,9 +16,9 @@ TEST(RpcKernels, AgreeWithEachOther)
 {
     std::vector<const RpcKernels*> oOthers;
 #if defined(__x86_64__)
-    if (raster::detail::RunsAvx2())
+    if (simd::RunsAvx2())
         oOthers.push_back(&GetAvx2RpcKernels());
-    if (raster::detail::RunsAvx512())
+    if (simd::RunsAvx512())
         oOthers.push_back(&GetAvx512RpcKernels());
 #endif
     std::mt19937 oRandom(11);

@@ -4,6 +4,7 @@
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/validitysource.h"
 #include "datasources/writer/basicwriter.h"
+#include "datasources/writer/multitypewriter.h"
 #include "gobs/mask/mask.h"
 #include "gobs/raster/rasterview.h"
 #include "tests/support/facts.h"
@@ -86,6 +87,54 @@ TEST(Warp, GridsAreThoseThatAreAskedFor)
     // Its own grid gives its own pixels.
     ASSERT_EQ(RunKrv({"warp", file, target, "--like", file, "--resampling", "cubic"}).code, 0);
     EXPECT_EQ(ReadPixels(BasicReader(target)), ReadPixels(BasicReader(file)));
+}
+
+TEST(Warp, KeepsTheTypeOfEachChannelWithAnyNumberOfThreads)
+{
+    const TempFolder oFolder;
+    const std::string file = oFolder.GetPath() + "/mixed.krv", half = oFolder.GetPath() + "/half.krv";
+    const std::vector<krv::gobs::DataType> oTypes = {krv::gobs::eDT_8U, krv::gobs::eDT_32R, krv::gobs::eDT_8U};
+    {
+        MultiTypeWriter oWriter(file, {1, 2, 3}, "KRVDSK", "", MixedTypes{oTypes, {}});
+        oWriter.CreateNewFile({700, 600, 3, krv::gobs::eDT_32R});
+        oWriter.SetGeocodingInfo({1000, 10, 0, 5000, 0, -10});
+        krv::gobs::Raster oRaster({700, 600, 3, krv::gobs::eDT_32R}, {0, 0});
+        for (unsigned int n = 0; n < 700 * 600 * 3; ++n)
+            reinterpret_cast<float*>(oRaster.GetBuffer())[n] = static_cast<float>(n * 7 % 251);
+        oWriter.WriteRaster(&oRaster);
+        oWriter.Synchronize();
+    }
+    // The outline is wider: of 8U a mask says so.
+    const std::vector<std::string> oGrid = {"--bounds", "500,-1500,8500,5100", "--resolution",
+                                            "12,11",    "--resampling",        "cubic"};
+    const auto Run = [&](std::vector<std::string> oWords)
+    {
+        oWords.insert(oWords.end(), oGrid.begin(), oGrid.end());
+        return RunKrv(oWords).code;
+    };
+    ASSERT_EQ(Run({"--threads", "3", "warp", file, half, "--format", "KRVDSK"}), 0);
+    for (unsigned int nChannel = 1; nChannel <= 3; ++nChannel)
+    {
+        BasicReader oMixed(half, {nChannel});
+        EXPECT_EQ(oMixed.GetDataType(), oTypes[nChannel - 1]);
+        const std::string number = std::to_string(nChannel);
+        std::vector<std::string> oFiles;
+        for (const char* const pThreads : {"1", "2", "8"})
+        {
+            oFiles.push_back(oFolder.GetPath() + "/" + number + pThreads + ".tif");
+            ASSERT_EQ(Run({"--threads", pThreads, "warp", file, oFiles.back(), "--channels", number, "--options",
+                           "COMPRESS=DEFLATE BLOCKXSIZE=128 BLOCKYSIZE=128 TILED=YES"}),
+                      0);
+            EXPECT_EQ(krv::conformance::ReadFile(oFiles.back()), krv::conformance::ReadFile(oFiles.front()));
+        }
+        EXPECT_EQ(ReadPixels(oMixed), ReadPixels(BasicReader(oFiles.front())));
+    }
+    BasicReader oMixed(half, {1}), oOne(oFolder.GetPath() + "/11.tif", {1});
+    const ValiditySource oMixedValidity(oMixed.GetDataset()), oOneValidity(oOne.GetDataset());
+    const RasterPtr oA(oMixed.ReadRaster(0, 0, 660, 600)), oB(oOne.ReadRaster(0, 0, 660, 600));
+    const auto oMixedMask = oMixedValidity.BuildMask(*oA), oOneMask = oOneValidity.BuildMask(*oB);
+    EXPECT_LT(oOneMask->CountSet(), 660u * 600u);
+    EXPECT_EQ(oMixedMask->CountSet(), oOneMask->CountSet());
 }
 
 TEST(Warp, WindowsInMapCoordinatesAreThoseInPixels)

@@ -1,6 +1,7 @@
 #include "gobs/mask/detail/backgroundkernel.h"
 
 #include "gobs/mask/detail/vectormark.h"
+#include "toolkit/simd/processor.h"
 
 #include <cstring>
 
@@ -19,17 +20,6 @@ constexpr std::size_t GROUP = 16; // pixels
     constexpr std::size_t BYTES_PER_TEST = 48;
     return nChannels <= 4096 && nTests * BYTES_PER_TEST >= nChannels * nSampleSize;
 }
-
-#if defined(KRV_VECTOR_MASKS)
-bool RunsAvx512()
-{
-    static const bool bRuns = __builtin_cpu_supports("avx512f") && __builtin_cpu_supports("avx512bw") &&
-                              __builtin_cpu_supports("avx512dq") && __builtin_cpu_supports("avx512vl") &&
-                              __builtin_cpu_supports("avx512vbmi") && __builtin_cpu_supports("gfni") &&
-                              __builtin_cpu_supports("bmi2");
-    return bRuns;
-}
-#endif
 
 } // namespace
 
@@ -92,9 +82,9 @@ std::size_t BackgroundKernel<Sample>::MarkVectors([[maybe_unused]] const unsigne
     {
         nDone += Mark(pPixels + nDone * nPixelBytes, nPixels - nDone, oPattern, pBits + nDone / 8);
     };
-    if (RunsAvx512())
+    if (krv::simd::RunsAvx512())
         oMark(MarkByAvx512<Sample>);
-    if (__builtin_cpu_supports("avx2"))
+    if (krv::simd::RunsAvx2())
         oMark(MarkByAvx2<Sample>);
     oMark(MarkBySse<Sample>);
     return nDone;

@@ -1,5 +1,7 @@
 #include "gobs/pct/detail/colourkernels.h"
 
+#include "toolkit/simd/processor.h"
+
 #include <cstring>
 
 namespace krv::gobs::detail
@@ -39,8 +41,7 @@ void WithoutAlpha(const Colour* pList, const unsigned char* pValues, std::size_t
 ColourLoop FindColourLoop(std::size_t nValueBytes, bool bAlpha)
 {
 #if defined(__x86_64__)
-    if (nValueBytes == 1 && __builtin_cpu_supports("avx512vbmi") && __builtin_cpu_supports("avx512vl") &&
-        __builtin_cpu_supports("avx512bw"))
+    if (nValueBytes == 1 && krv::simd::RunsAvx512())
         return FindAvx512ColourLoop(bAlpha);
 #endif
     if (nValueBytes == 1)

@@ -1,6 +1,7 @@
 #include "gobs/power/detail/powerkernels.h"
 
 #include "gobs/power/detail/powerkernelcode.h"
+#include "toolkit/simd/processor.h"
 
 namespace krv::gobs::detail
 {
@@ -13,10 +14,9 @@ PowerLoop FindBaselinePowerLoop(NativeDataTypeCode ePart)
 PowerLoop FindPowerLoop(NativeDataTypeCode ePart)
 {
 #if defined(__x86_64__)
-    if (__builtin_cpu_supports("avx512vbmi") && __builtin_cpu_supports("avx512vl") &&
-        __builtin_cpu_supports("avx512bw") && __builtin_cpu_supports("avx512dq"))
+    if (krv::simd::RunsAvx512())
         return FindAvx512PowerLoop(ePart);
-    if (__builtin_cpu_supports("avx2"))
+    if (krv::simd::RunsAvx2())
         return FindAvx2PowerLoop(ePart);
 #endif
     return FindBaselinePowerLoop(ePart);

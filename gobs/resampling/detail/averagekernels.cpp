@@ -1,6 +1,7 @@
 #include "gobs/resampling/detail/averagekernels.h"
 
 #include "gobs/resampling/detail/averagekernelcode.h"
+#include "toolkit/simd/processor.h"
 
 namespace krv::gobs::detail
 {
@@ -15,10 +16,9 @@ ReduceLoop FindReduceLoop(NativeDataTypeCode eType, unsigned int nSamples, std::
                           std::size_t nSumBytes)
 {
 #if defined(__x86_64__)
-    if (__builtin_cpu_supports("avx512vbmi") && __builtin_cpu_supports("avx512vl") &&
-        __builtin_cpu_supports("avx512bw") && __builtin_cpu_supports("avx512dq"))
+    if (krv::simd::RunsAvx512())
         return FindAvx512Loop(eType, nSamples, nSourceBytes, nSumBytes);
-    if (__builtin_cpu_supports("avx2"))
+    if (krv::simd::RunsAvx2())
         return FindAvx2Loop(eType, nSamples, nSourceBytes, nSumBytes);
 #endif
     return FindBaselineLoop(eType, nSamples, nSourceBytes, nSumBytes);

@@ -1,6 +1,7 @@
 #include "gobs/resampling/detail/plainkernels.h"
 
 #include "gobs/resampling/detail/plainkernelcode.h"
+#include "toolkit/simd/processor.h"
 
 namespace krv::gobs::detail
 {
@@ -28,10 +29,9 @@ enum class Instructions
 Instructions FindInstructions()
 {
 #if defined(__x86_64__)
-    if (__builtin_cpu_supports("avx512vbmi") && __builtin_cpu_supports("avx512vl") &&
-        __builtin_cpu_supports("avx512bw") && __builtin_cpu_supports("avx512dq"))
+    if (krv::simd::RunsAvx512())
         return Instructions::eAvx512;
-    if (__builtin_cpu_supports("avx2"))
+    if (krv::simd::RunsAvx2())
         return Instructions::eAvx2;
 #endif
     return Instructions::eBaseline;

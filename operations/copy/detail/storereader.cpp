@@ -7,15 +7,19 @@
 #include "datasources/reader/irasterreader.h"
 #include "datasources/reader/readervalidity.h"
 #include "datasources/writer/basicwriter.h"
+#include "datasources/writer/splitwriter.h"
 #include "gobs/mask/mask.h"
 #include "gobs/raster/raster.h"
 #include "operations/copy/detail/copyrecord.h"
 #include "operations/copy/detail/target.h"
 #include "operations/job/exceptions.h"
 #include "operations/job/progress.h"
+#include "operations/source/fileworkers.h"
 #include "toolkit/ogc/cs/icrs.h"
+#include "toolkit/threading/foreachitem.h"
 
 #include <algorithm>
+#include <cstring>
 #include <filesystem>
 #include <memory>
 #include <system_error>
@@ -63,6 +67,20 @@ void StorePlace(const IRasterReader& oReader, const PixelWindow& oWindow, const 
     oTarget.Try("the geocoding", [&] { poTo->SetGeocoding(ShiftGeocoding(*poInfo, oWindow.x, oWindow.y)); });
 }
 
+struct Part
+{
+    krv::gobs::RasterContext place;
+    unsigned int width;
+    unsigned int height;
+};
+
+// A part of the new file on its way there: for each reader, and for the mask.
+struct Piece
+{
+    std::vector<std::shared_ptr<const SplitWriter::Encoded>> encoded;
+    std::uint64_t bytes = 0;
+};
+
 // The validity mask of the target, when there is something that no value says; null when not, or when it has no masks.
 std::unique_ptr<BasicWriter> MakeMask(bool bNeeded, const Target& oTarget)
 {
@@ -81,12 +99,81 @@ std::unique_ptr<BasicWriter> MakeMask(bool bNeeded, const Target& oTarget)
     return std::make_unique<BasicWriter>(poBitmaps, std::vector<unsigned int>{nBitmap});
 }
 
-void WriteMask(BasicWriter& oWriter, const Mask& oMask, unsigned int nX, unsigned int nY)
+// What a thread reads with.
+class Worker
 {
-    Raster oValid({oMask.GetWidth(), oMask.GetHeight(), 1, krv::gobs::eDT_8U},
-                  {static_cast<int>(nX), static_cast<int>(nY)});
-    oMask.RetrieveRaster(oValid);
-    oWriter.WriteRaster(&oValid);
+public:
+    Worker(FilePointer poFile, const std::vector<StoredChannels>& oStored) : mpoFile(std::move(poFile))
+    {
+        for (const StoredChannels& oChannels : oStored)
+        {
+            moReaders.push_back(oChannels.open(*mpoFile));
+            moValidities.push_back(std::make_unique<ReaderValidity>(*moReaders.back()));
+        }
+    }
+
+    IRasterReader& GetReader(std::size_t nReader) const { return *moReaders[nReader]; }
+
+    // Whether no value of its channels says which pixels are not valid.
+    bool NeedsMask(std::size_t nReader) const
+    {
+        return moValidities[nReader]->IsNeeded() && !HasNoData(moReaders[nReader]->GetAuxiliaryData());
+    }
+
+    // The pixels at a place of the new file, which are those at another one of the reader's. The valid ones are added
+    // to the mask, a byte for each pixel, unless it is null.
+    std::shared_ptr<const Raster> Read(std::size_t nReader, const krv::gobs::RasterContext& oFrom, const Part& oPart,
+                                       Raster* poMask)
+    {
+        IRasterReader& oReader = *moReaders[nReader];
+        const krv::gobs::RasterInfo oInfo(oPart.width, oPart.height, oReader.GetChansCount(), oReader.GetDataType());
+        auto poPiece = std::make_shared<Raster>(oInfo, oPart.place);
+        Raster oPixels(oInfo, oFrom, poPiece->GetBuffer(), false);
+        if (poMask == nullptr || !NeedsMask(nReader))
+            oReader.ReadRaster(&oPixels);
+        else
+            AddValid(moValidities[nReader]->Read(oPixels).get(), *poMask);
+        return poPiece;
+    }
+
+private:
+    static void AddValid(const Mask* poValid, Raster& oMask)
+    {
+        const std::uint64_t nPixels = std::uint64_t{oMask.GetWidth()} * oMask.GetHeight();
+        if (poValid == nullptr)
+            return static_cast<void>(std::memset(oMask.GetBuffer(), 1, nPixels));
+        Raster oValid({oMask.GetWidth(), oMask.GetHeight(), 1, krv::gobs::eDT_8U}, {0, 0});
+        poValid->RetrieveRaster(oValid);
+        for (std::uint64_t n = 0; n < nPixels; ++n)
+            oMask.GetBuffer()[n] |= oValid.GetBuffer()[n];
+    }
+
+    FilePointer mpoFile;
+    std::vector<std::shared_ptr<IRasterReader>> moReaders;
+    std::vector<std::unique_ptr<ReaderValidity>> moValidities; // after the readers, which they stand on
+};
+
+// The record of all channels: that of the file is the first reader's.
+AuxiliaryData JoinRecords(const Worker& oWorker, const std::vector<StoredChannels>& oStored)
+{
+    AuxiliaryData oFirst = oWorker.GetReader(0).GetAuxiliaryData().GetCleanedMeta();
+    if (oStored.size() == 1)
+        return oFirst;
+    std::size_t nChannels = 0;
+    for (const StoredChannels& oChannels : oStored)
+        nChannels += oChannels.channels.size();
+    AuxiliaryData oRecord(static_cast<unsigned int>(nChannels));
+    oRecord.SetFileMetadata(oFirst.GetFileMetadata());
+    for (std::size_t n = 0; n < oStored.size(); ++n)
+    {
+        const AuxiliaryData oOwn = oWorker.GetReader(n).GetAuxiliaryData().GetCleanedMeta();
+        for (unsigned int nAt = 1; nAt <= oStored[n].channels.size(); ++nAt)
+        {
+            oRecord.SetChanMetadata(oOwn.GetChanMetadata(nAt), oStored[n].channels[nAt - 1]);
+            oRecord.SetChannelDescription(oOwn.GetChannelDescription(nAt), oStored[n].channels[nAt - 1]);
+        }
+    }
+    return oRecord;
 }
 
 } // namespace
@@ -103,39 +190,78 @@ void CheckTarget(const std::vector<std::string>& oSources, const std::string& ta
         throw krv::DataException(target + " is there and no plain file; name another for the copy");
 }
 
-void StoreReader(IRasterReader& oReader, const PixelWindow& oWindow, const Target& oTarget, const char* pPart)
+void StoreReaders(const SourceFile& oFile, const std::vector<StoredChannels>& oStored, const PixelWindow& oWindow,
+                  const Target& oTarget, const char* pPart)
 {
-    StorePlace(oReader, oWindow, oTarget);
-    const AuxiliaryData oRecord = oReader.GetAuxiliaryData().GetCleanedMeta();
+    FileWorkers<Worker> oWorkers(oFile, [&oStored](FilePointer poFile)
+                                 { return std::make_unique<Worker>(std::move(poFile), oStored); });
+    const Worker oFirst(FilePointer(&oFile, {false}), oStored); // for what there is one of
+    StorePlace(oFirst.GetReader(0), oWindow, oTarget);
+    const AuxiliaryData oRecord = JoinRecords(oFirst, oStored);
     oTarget.Try("the metadata", [&] { oTarget.Get().WriteAuxiliaryData(oRecord); });
-    ReaderValidity oValidity(oReader);
-    BasicWriter oWriter(&oTarget.GetRaster(), {});
-    const std::unique_ptr<BasicWriter> poMask = MakeMask(oValidity.IsNeeded() && !HasNoData(oRecord), oTarget);
-    const unsigned int nWidth = PieceSide(oWriter.GetTileWidth(), oWindow.width);
-    const unsigned int nHeight = PieceSide(oWriter.GetTileHeight(), oWindow.height);
-    ProgressCounter oCounter(
-        oTarget.GetProgress(), pPart,
-        krv::gobs::BufferBytes(oWindow.width, oWindow.height, oReader.GetChansCount(), oReader.GetDataType()));
-    for (unsigned int nY = 0; nY < oWindow.height; nY += std::min(nHeight, oWindow.height - nY))
+
+    krv::threading::IExecutor* const poExecutor = oTarget.GetExecutor();
+    std::vector<std::unique_ptr<BasicWriter>> oWriters;
+    bool bMask = false;
+    std::uint64_t nBytes = 0;
+    for (std::size_t n = 0; n < oStored.size(); ++n)
     {
-        for (unsigned int nX = 0; nX < oWindow.width; nX += std::min(nWidth, oWindow.width - nX))
-        {
-            const krv::gobs::RasterInfo oInfo(std::min(nWidth, oWindow.width - nX),
-                                              std::min(nHeight, oWindow.height - nY), oReader.GetChansCount(),
-                                              oReader.GetDataType());
-            Raster oPiece(oInfo, {static_cast<int>(oWindow.x + nX), static_cast<int>(oWindow.y + nY)});
-            std::unique_ptr<Mask> poValid;
-            if (poMask != nullptr)
-                poValid = oValidity.Read(oPiece);
-            else
-                oReader.ReadRaster(&oPiece);
-            const Raster oStored(oInfo, {static_cast<int>(nX), static_cast<int>(nY)}, oPiece.GetBuffer(), false);
-            oWriter.WriteRaster(&oStored);
-            if (poValid != nullptr)
-                WriteMask(*poMask, *poValid, nX, nY);
-            oCounter.Advance(oPiece.GetBufferSize());
-        }
+        const IRasterReader& oReader = oFirst.GetReader(n);
+        oWriters.push_back(std::make_unique<BasicWriter>(&oTarget.GetRaster(), oStored[n].channels));
+        bMask = bMask || oFirst.NeedsMask(n);
+        nBytes += krv::gobs::BufferBytes(oWindow.width, oWindow.height, oReader.GetChansCount(), oReader.GetDataType());
     }
+    const std::size_t nMask = oWriters.size();
+    if (std::unique_ptr<BasicWriter> poMask = MakeMask(bMask, oTarget))
+        oWriters.push_back(std::move(poMask));
+
+    ProgressCounter oCounter(oTarget.GetProgress(), pPart, nBytes);
+    krv::threading::TaskGroup oThreads(poExecutor, [&oCounter] { oCounter.Repeat(); });
+    std::vector<std::unique_ptr<SplitWriter>> oSplit;
+    for (const auto& poWriter : oWriters)
+        oSplit.push_back(std::make_unique<SplitWriter>(*poWriter, 1, oThreads.GetThreadCount()));
+    const unsigned int nWidth = PieceSide(oWriters.front()->GetTileWidth(), oWindow.width);
+    const unsigned int nHeight = PieceSide(oWriters.front()->GetTileHeight(), oWindow.height);
+    const std::uint64_t nAcross = (std::uint64_t{oWindow.width} + nWidth - 1) / nWidth;
+    const std::uint64_t nDown = (std::uint64_t{oWindow.height} + nHeight - 1) / nHeight;
+    krv::threading::ForEachItem(
+        oThreads, nAcross * nDown,
+        [&](std::uint64_t nPiece)
+        {
+            const auto nX = static_cast<unsigned int>(nPiece % nAcross * nWidth);
+            const auto nY = static_cast<unsigned int>(nPiece / nAcross * nHeight);
+            const Part oPart{{static_cast<int>(nX), static_cast<int>(nY)},
+                             std::min(nWidth, oWindow.width - nX),
+                             std::min(nHeight, oWindow.height - nY)};
+            std::shared_ptr<Raster> poValid;
+            if (oSplit.size() > nMask)
+            {
+                poValid = std::make_shared<Raster>(
+                    krv::gobs::RasterInfo(oPart.width, oPart.height, 1, krv::gobs::eDT_8U), oPart.place);
+                std::memset(poValid->GetBuffer(), 0, poValid->GetBufferSize());
+            }
+            Piece oPiece;
+            for (std::size_t n = 0; n < nMask; ++n)
+            {
+                std::shared_ptr<const Raster> poPixels;
+                {
+                    const FileWorkers<Worker>::Use oWorker(oWorkers);
+                    poPixels = oWorker->Read(n, {static_cast<int>(oWindow.x + nX), static_cast<int>(oWindow.y + nY)},
+                                             oPart, poValid.get());
+                }
+                oPiece.bytes += poPixels->GetBufferSize();
+                oPiece.encoded.push_back(oSplit[n]->Encode(std::move(poPixels)));
+            }
+            if (poValid != nullptr)
+                oPiece.encoded.push_back(oSplit[nMask]->Encode(std::move(poValid)));
+            return oPiece;
+        },
+        [&](const Piece& oPiece)
+        {
+            for (std::size_t n = 0; n < oPiece.encoded.size(); ++n)
+                oSplit[n]->Store(*oPiece.encoded[n]);
+            oCounter.Advance(oPiece.bytes);
+        });
     oTarget.Get().Close();
 }
 

@@ -68,9 +68,10 @@ void Target::Warn(const std::string& message)
     krv::nspio::Warning::Warn(message);
 }
 
-Target::Target(const TargetLayout& oLayout, const TargetForm& oForm, const Progress& oProgress)
-    : moName(oForm.name), moFormat(ChooseFormat(oForm)), moLayout(oLayout), moProgress(oProgress), mpoExecutor(nullptr),
-      mbChecked(oForm.check), mbNew(!std::filesystem::exists(oForm.name))
+Target::Target(const TargetLayout& oLayout, const TargetForm& oForm, const Progress& oProgress,
+               krv::threading::IExecutor* poExecutor)
+    : moName(oForm.name), moFormat(ChooseFormat(oForm)), moLayout(oLayout), moProgress(oProgress),
+      mpoExecutor(poExecutor), mbChecked(oForm.check), mbNew(!std::filesystem::exists(oForm.name))
 {
     MakeByUser(oForm, oForm.options);
 }

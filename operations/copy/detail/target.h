@@ -32,7 +32,8 @@ public:
            krv::threading::IExecutor* poExecutor);
 
     // Lays the file out as the user's options say, and where they are silent as the format does.
-    Target(const TargetLayout& oLayout, const TargetForm& oForm, const Progress& oProgress);
+    Target(const TargetLayout& oLayout, const TargetForm& oForm, const Progress& oProgress,
+           krv::threading::IExecutor* poExecutor);
 
     template <typename Facet>
     Facet* Find() const

@@ -2,6 +2,7 @@
 // loops.
 
 #include "gobs/resampling/detail/averagekernels.h"
+#include "toolkit/simd/processor.h"
 
 #include <gtest/gtest.h>
 
@@ -24,7 +25,7 @@ std::vector<std::pair<const char*, Find>> GetSets()
 {
     std::vector<std::pair<const char*, Find>> oSets{{"baseline", FindBaselineLoop}, {"chosen", FindReduceLoop}};
 #if defined(__x86_64__)
-    if (__builtin_cpu_supports("avx2"))
+    if (krv::simd::RunsAvx2())
         oSets.emplace_back("AVX2", FindAvx2Loop);
 #endif
     return oSets;

@@ -2,6 +2,7 @@
 
 #include "gobs/power/detail/powerkernels.h"
 #include "gobs/resampling/detail/plainkernels.h"
+#include "toolkit/simd/processor.h"
 
 #include <gtest/gtest.h>
 
@@ -59,7 +60,7 @@ TEST(VectorKernels, PowerIsTheSameForEveryProcessor)
                 const Bytes oExpected = Run(FindBaselinePowerLoop(eType));
                 EXPECT_EQ(Run(FindPowerLoop(eType)), oExpected);
 #if defined(__x86_64__)
-                if (__builtin_cpu_supports("avx2"))
+                if (krv::simd::RunsAvx2())
                 {
                     EXPECT_EQ(Run(FindAvx2PowerLoop(eType)), oExpected) << nCode << " " << nSamples;
                 }
@@ -99,7 +100,7 @@ TEST(VectorKernels, InterpolationIsTheSameForEveryProcessor)
                 const Bytes oExpected = Run(FindBaselinePlainLoop(eMethod, eType, nSamples));
                 EXPECT_EQ(Run(FindPlainLoop(eMethod, eType, nSamples)), oExpected);
 #if defined(__x86_64__)
-                if (__builtin_cpu_supports("avx2"))
+                if (krv::simd::RunsAvx2())
                 {
                     EXPECT_EQ(Run(FindAvx2PlainLoop(eMethod, eType, nSamples)), oExpected) << eType << nSamples;
                 }

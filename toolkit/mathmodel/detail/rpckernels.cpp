@@ -1,6 +1,6 @@
 #include "toolkit/mathmodel/detail/rpckernels.h"
 
-#include "toolkit/raster/detail/kernels.h"
+#include "toolkit/simd/processor.h"
 
 namespace krv::mathmodel::detail
 {
@@ -11,9 +11,9 @@ namespace
 const RpcKernels& ChooseKernels()
 {
 #if defined(__x86_64__)
-    if (raster::detail::RunsAvx512())
+    if (simd::RunsAvx512())
         return GetAvx512RpcKernels();
-    if (raster::detail::RunsAvx2() && __builtin_cpu_supports("fma"))
+    if (simd::RunsAvx2())
         return GetAvx2RpcKernels();
 #endif
     return GetBaselineRpcKernels();

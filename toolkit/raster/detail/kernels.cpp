@@ -1,5 +1,7 @@
 #include "toolkit/raster/detail/kernels.h"
 
+#include "toolkit/simd/processor.h"
+
 namespace krv::raster::detail
 {
 
@@ -9,9 +11,9 @@ namespace
 const Kernels& ChooseKernels()
 {
 #if defined(__x86_64__)
-    if (RunsAvx512())
+    if (simd::RunsAvx512())
         return GetAvx512Kernels();
-    if (RunsAvx2())
+    if (simd::RunsAvx2())
         return GetAvx2Kernels();
 #endif
     return GetBaselineKernels();

@@ -68,8 +68,4 @@ const Kernels& GetBaselineKernels();
 const Kernels& GetAvx2Kernels();
 const Kernels& GetAvx512Kernels();
 
-// Whether this processor, and its system, run them.
-bool RunsAvx2();
-bool RunsAvx512();
-
 } // namespace krv::raster::detail

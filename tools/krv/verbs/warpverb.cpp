@@ -3,6 +3,7 @@
 #include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/progress.h"
+#include "tools/krv/threads.h"
 #include "tools/krv/verbs/verbs.h"
 
 #include <CLI/CLI.hpp>
@@ -57,7 +58,7 @@ int RunWarp(const std::string& file, Options& oOptions)
     const auto oNoData = ParseReals(oOptions.noData, "--nodata", 1, 1);
     if (!oNoData.empty())
         oRequest.noData = oNoData.front();
-    const WarpResult oResult = Warp(oRequest, oOptions.form, ShowProgress());
+    const WarpResult oResult = Warp(oRequest, oOptions.form, ShowProgress(), GetExecutor());
     Print(Describe(oOptions.form.name, oResult));
     return 0;
 }
