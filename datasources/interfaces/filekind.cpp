@@ -45,6 +45,7 @@ constexpr Kind KINDS[] = {
      "xz data: unpack it first"},
     {0, "\x28\xb5\x2f\xfd"sv, "zstd data: unpack it first"},
     {0, "%PDF"sv, "a PDF document"},
+    {0, "\x8BKRVDSK\r\n\x1A\n\0"sv, "a native file of the toolkit"},
     {0, "DEMO1\n"sv, "a DEMO file"},
     {0, "<?xml"sv, "an XML document"},
     {0, "<!DOCTYPE html"sv, "a web page: was the download redirected?"},
