@@ -384,10 +384,8 @@ std::string DescribeUnknown(const std::string& file)
     const std::string kind = GuessFileKind(oHeader.data(), ReadHeader(file, oHeader));
     if (!kind.empty())
         return "it begins like " + kind;
-    const std::filesystem::path oPath(file);
-    for (const std::string& header :
-         {file + ".rsc", file + ".par", (oPath.parent_path() / oPath.stem()).string() + ".par",
-          (oPath.parent_path() / oPath.stem()).string() + "_dem.par"})
+    const std::string stem = std::filesystem::path(file).replace_extension().string();
+    for (const std::string& header : {file + ".rsc", file + ".par", stem + ".par", stem + "_dem.par"})
     {
         std::error_code oNone;
         if (std::filesystem::is_regular_file(header, oNone))
@@ -417,8 +415,8 @@ std::vector<Finding> CheckFile(const std::string& file, const std::vector<Loaded
     bool bRecognised = false;
     for (const LoadedPlugin& oPlugin : oPlugins)
         AskPlugin(file, oPlugin, oHeader, bRecognised, oFindings);
-    if (const std::string cause = bRecognised ? std::string() : DescribeUnknown(file); !cause.empty())
-        oFindings.push_back({false, "file " + file, "no format recognises it: " + cause, {}});
+    if (const std::string seems = bRecognised ? std::string() : DescribeUnknown(file); !seems.empty())
+        oFindings.push_back({false, "file " + file, "no format recognises it: " + seems, {}});
     else if (!bRecognised)
         oFindings.push_back({false, "file " + file, "no format recognises it",
                              "install the plug-in of its format, or convert it to one that `krv formats` lists"});
