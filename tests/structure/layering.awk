@@ -28,11 +28,12 @@ BEGIN {
     opens["plugins/mosaic", "datasources/mosaic"] = 1;
 
     # Libraries of others, and the only folders that may know them.
-    home["^(xercesc|xalanc)/"] = "^(toolkit/xml|datasources/iomanager|datasources/formatregistrar)/";
+    home["^(xercesc|xalanc)/"] = "^(toolkit/xml|datasources/iomanager)/";
+    home["^expat\\.h"] = "^toolkit/xml/";
     home["^boost/"] = "^datasources/metadata/";
     home["^(proj\\.h|proj/)"] = "^toolkit/ogc/cs/";
     home["^(tiff|tiffio|geotiff|geo_|geokeys|geovalues|xtiffio)"] = "^(plugins/tif|plugins/support/geotiff|tools/samplescene)/";
-    home["^(libdeflate|zstd|lz4|lz4hc|zlib)\\.h"] = "^(plugins/support|plugins/tif|operations)/";
+    home["^(libdeflate|zstd|lz4|lz4hc|zlib|isa-l/crc)\\.h"] = "^(plugins/support|plugins/tif|operations)/";
     home["^openjpeg"] = "^plugins/jp2/";
     home["^(CLI|nlohmann)/"] = "^tools/";
     home["^fmt/"] = "^(operations|tools)/";

@@ -1,9 +1,13 @@
 #include "plugins/support/writing/filewriter.h"
 
 #include "plugins/support/file/scratchfile.h"
+#include "plugins/support/sidecar/sidecarfile.h"
+#include "plugins/support/writing/setaside.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <utility>
+
+#include <sys/stat.h>
 
 namespace krv::plugins::support
 {
@@ -59,8 +63,17 @@ void FileWriter::Synchronize()
 
 void FileWriter::GiveName()
 {
-    mpoNew->TakeName(mbReplaces);
+    TakeName(*mpoNew);
     SetNamed();
+}
+
+void FileWriter::TakeName(NewFile& oNew) const
+{
+    struct stat oStatus = {};
+    const bool bTaken = !TakesPlace() && ::lstat(moFileName.c_str(), &oStatus) == 0; // which is told below
+    SetAside oOld(mbNamed || bTaken ? std::vector<std::string>() : ListCompanions(moFileName));
+    oNew.TakeName(TakesPlace());
+    oOld.Drop();
 }
 
 void FileWriter::Finish()

@@ -1,4 +1,5 @@
 // FileEditor: how changes become the file's.
+#include "plugins/support/file/copypieces.h"
 #include "plugins/tif/writing/directorybytes.h"
 #include "plugins/tif/writing/fileeditor.h"
 #include "plugins/tif/writing/pagewriter.h"
@@ -16,7 +17,7 @@ namespace
 
 // A file up to this size costs little to be written twice.
 constexpr std::uint64_t SMALL_FILE = std::uint64_t{4} << 20;
-constexpr std::size_t COPY_BYTES = std::size_t{1} << 20;
+constexpr std::size_t COPIED_PIECES = 4096;
 
 // A page with the places that it gets.
 struct Placed
@@ -62,24 +63,21 @@ void PlaceDirectory(Placed& oPlaced, const FileHeader& oHeader, std::uint64_t nB
     oPlaced.moCountArray = oSpace.Allocate(oPage.GetStriles() * nWord);
 }
 
-void CopyBlocks(Placed& oPlaced, const support::File& oSource, support::Space& oSpace, support::File& oTarget)
+void CopyBlocks(Placed& oPlaced, const support::File& oSource, support::Space& oSpace, support::File& oTarget,
+                support::Scratch& oScratch)
 {
-    std::vector<unsigned char> oBytes;
     PageModel& oPage = oPlaced.moPage;
+    std::vector<support::CopiedPiece> oPieces;
     for (std::size_t nAt = 0; nAt < oPage.GetStriles(); ++nAt)
     {
         const std::uint64_t nBytes = oPage.moByteCounts[nAt];
-        oPage.moOffsets[nAt] = 0;
-        if (nBytes == 0)
+        oPage.moOffsets[nAt] = nBytes == 0 ? 0 : oSpace.Allocate(nBytes).mnOffset;
+        if (nBytes != 0)
+            oPieces.push_back({oPlaced.mpOld->moOffsets[nAt], oPage.moOffsets[nAt], nBytes});
+        if (oPieces.size() < COPIED_PIECES && nAt + 1 < oPage.GetStriles())
             continue;
-        const Extent oNew = oSpace.Allocate(nBytes);
-        for (std::uint64_t nDone = 0; nDone < nBytes; nDone += oBytes.size())
-        {
-            oBytes.resize(std::min<std::uint64_t>(nBytes - nDone, COPY_BYTES));
-            oSource.Read(oPlaced.mpOld->moOffsets[nAt] + nDone, oBytes.data(), oBytes.size());
-            oTarget.Write(oNew.mnOffset + nDone, oBytes.data(), oBytes.size());
-        }
-        oPage.moOffsets[nAt] = oNew.mnOffset;
+        support::CopyPieces(oSource, oTarget, std::move(oPieces), oScratch);
+        oPieces.clear();
     }
 }
 
@@ -113,8 +111,9 @@ void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, con
                           "the file would pass the limit of 4 GiB of classic TIFF");
     for (Placed& oPlaced : oSorted)
         PlaceDirectory(oPlaced, oHeader, &oPlaced == oSorted.data() ? support::RoomRecord::GetBytes(0) : 0, oSpace);
+    support::Scratch oScratch;
     for (auto oPlaced = oSorted.rbegin(); oPlaced != oSorted.rend(); ++oPlaced)
-        CopyBlocks(*oPlaced, oSource, oSpace, oTarget);
+        CopyBlocks(*oPlaced, oSource, oSpace, oTarget, oScratch);
     for (std::size_t nAt = 0; nAt < oSorted.size(); ++nAt)
         WriteDirectory(oSorted[nAt], oHeader,
                        nAt + 1 < oSorted.size() ? oSorted[nAt + 1].moPage.moDirectory.mnOffset : 0, oTarget);
@@ -269,7 +268,12 @@ void FileEditor::Finish()
     CheckWritable();
     if (!HasFile())
         return End();
-    Store();
+    // A file that has no name yet and gets its order anew need not reach the disk before that.
+    const bool bOnlyLaidOut = moOptions.mbCloud && !IsNamed();
+    if (bOnlyLaidOut)
+        StoreHeld();
+    else
+        Store();
     if (!moOptions.mbCloud && !IsWasteful())
     {
         Synchronize();
@@ -285,7 +289,7 @@ void FileEditor::Finish()
     support::NewFile oLaidOut(GetFileName(), TakesPlace());
     WriteCloudLayout(moPages, moHeader, *GetFile(), *oLaidOut.GetFile(), moOptions.mbCloud);
     oLaidOut.GetFile()->Flush();
-    oLaidOut.TakeName(TakesPlace());
+    TakeName(oLaidOut);
     SetNamed();
     End();
 }
@@ -307,14 +311,16 @@ void FileEditor::Commit(const std::vector<Written>& oWritten)
 }
 
 // What was written reaches the disk before the one number that makes it the file's, and that before anything of the
-// former state is given up.
+// former state is given up. A new file is nobody's until it has its name: all of it reaches the disk at once.
 void FileEditor::Publish(const std::vector<Written>& oWritten)
 {
     const Written& oFirst = oWritten.back();
     const bool bFirst = oFirst.mpPage == moPages.front().get();
+    const bool bNew = !IsNamed();
     try
     {
-        GetFile()->Flush();
+        if (!bNew)
+            GetFile()->Flush();
     }
     catch (...)
     {
@@ -327,7 +333,6 @@ void FileEditor::Publish(const std::vector<Written>& oWritten)
     unsigned char aHeader[FileHeader::BYTES] = {};
     moHeader.Write(aHeader, moHeader.mnFirstDirectory);
     const std::size_t nPlace = moHeader.mbBigTiff ? 8 : 4;
-    const bool bNew = !IsNamed();
     GetFile()->Write(bNew ? 0 : nPlace, aHeader + (bNew ? 0 : nPlace), moHeader.GetBytes() - (bNew ? 0 : nPlace));
     GetFile()->Flush();
 

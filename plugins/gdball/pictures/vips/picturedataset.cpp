@@ -73,7 +73,7 @@ AuxiliaryData ReadTags(VipsImage& oImage, PictureKind eKind)
 } // namespace
 
 PictureDataset::PictureDataset(const std::string& fileName, Picture oPicture, krv::datasources::IFileFormat* poFormat)
-    : Dataset(fileName, poFormat)
+    : Dataset(fileName, poFormat), FacetsBeside(this)
 {
     const PictureKind eKind = oPicture.meKind;
     auto poSource = std::make_shared<PictureSource>(std::move(oPicture));
@@ -85,7 +85,7 @@ PictureDataset::PictureDataset(const std::string& fileName, Picture oPicture, kr
 }
 
 PictureDataset::PictureDataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<PictureWriter> poWriter)
-    : Dataset(poFormat, poWriter), mpoWriter(std::move(poWriter))
+    : Dataset(poFormat, poWriter), FacetsBeside(this), mpoWriter(std::move(poWriter))
 {
 }
 
@@ -185,7 +185,7 @@ void PictureDataset::Synchronize()
     }
     Dataset::Synchronize();
     if (IsWritten() && HasImage())
-        GetSidecars().StoreAuxXml();
+        GetSidecars().Store();
 }
 
 void PictureDataset::Close()

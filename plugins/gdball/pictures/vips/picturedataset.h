@@ -6,6 +6,7 @@
 #include "plugins/gdball/pictures/vips/picturesource.h"
 #include "plugins/gdball/pictures/vips/picturewriter.h"
 #include "plugins/support/dataset.h"
+#include "plugins/support/facetsbeside.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 
 #include <memory>
@@ -17,7 +18,8 @@ namespace krv::plugins::gdball
 // A picture, read by libvips or written by it. Whatever is no pixel lies in files beside it.
 class PictureDataset : public support::Dataset,
                        public krv::datasources::IGeocodedDataset,
-                       public krv::datasources::IPagedDataset
+                       public krv::datasources::IPagedDataset,
+                       public support::FacetsBeside
 {
 public:
     PictureDataset(const std::string& fileName, Picture oPicture, krv::datasources::IFileFormat* poFormat);
@@ -40,7 +42,7 @@ public:
     unsigned int CountFurtherImages() const override { return mnPages - 1; }
 
 private:
-    support::Sidecars::Needs GetNeeds() const override { return {true, true, true, false}; }
+    support::Sidecars::Needs GetNeeds() const override { return {true, true, true, true}; }
     support::AuxXml GetBeside(const char* pWhat, const Place& oPlace) const;
     void StoreBeside(support::AuxXml oAuxXml) const;
 

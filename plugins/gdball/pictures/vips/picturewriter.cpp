@@ -203,7 +203,7 @@ void PictureWriter::Store()
     support::NewFile oNew(GetFileName(), TakesPlace());
     Save(*oNew.GetFile());
     oNew.GetFile()->Flush();
-    oNew.TakeName(TakesPlace());
+    TakeName(oNew);
     SetNamed();
     mbChanged = false;
 }
