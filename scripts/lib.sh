@@ -8,10 +8,10 @@ cd "$KRV_ROOT"
 KRV_PACKAGES_BUILD=(g++ cmake ninja-build pkg-config
     libxerces-c-dev libxalan-c-dev libexpat1-dev libboost-regex-dev libproj-dev proj-data
     libtiff-dev libgeotiff-dev libjpeg62-turbo-dev libdeflate-dev libisal-dev libzstd-dev liblz4-dev zlib1g-dev libopenjp2-7-dev
-    libcli11-dev libfmt-dev nlohmann-json3-dev libpng-dev)
+    libcli11-dev libfmt-dev nlohmann-json3-dev libpng-dev libvips-dev)
 KRV_PACKAGES_TEST=(libgtest-dev libgmock-dev)
 # What benchmarks compare with; nothing else needs them.
-KRV_PACKAGES_BENCH=(libcairo2-dev libagg-dev libvips-dev libvips-tools libtiff-tools)
+KRV_PACKAGES_BENCH=(libcairo2-dev libagg-dev libvips-tools libtiff-tools)
 KRV_PACKAGES_FUZZ=(clang-16 libclang-rt-16-dev)
 KRV_PACKAGES_CI=(clang-format-14 clang-tidy-16)
 # API pages.

@@ -36,6 +36,8 @@ private:
 inline constexpr char CAPABILITY_CREATE[] = "/Format/Capabilities/Dataset/SupportsCreate";
 inline constexpr char CAPABILITY_METADATA[] = "/Format/Capabilities/Dataset/SupportsMetadata";
 inline constexpr char CAPABILITY_GEOREFERENCING[] = "/Format/Capabilities/Dataset/SupportsGeoreferecing";
+// The levels of a new file come with its pixels: they cannot be made apart, and are there when it is opened again.
+inline constexpr char CAPABILITY_MAKES_LEVELS[] = "/Format/Capabilities/Dataset/MakesLevels";
 inline constexpr char CAPABILITY_BITMAP_CREATE[] = "/Format/Capabilities/Bitmap/CanCreate";
 inline constexpr char CAPABILITY_BITMAP_DELETE[] = "/Format/Capabilities/Bitmap/CanDelete";
 inline constexpr char CAPABILITY_CONTROL_POINT_CREATE[] = "/Format/Capabilities/ControlPoint/CanCreate";

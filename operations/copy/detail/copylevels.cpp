@@ -2,9 +2,12 @@
 
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/iblocktransfer.h"
+#include "datasources/interfaces/ifileformat.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterio.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "datasources/iomanager/formatcapabilities.h"
 #include "datasources/overviews/overviewbuilder.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/writer/basicoverviewwriteraccessor.h"
@@ -398,7 +401,12 @@ void CopyLevels(const CopyPlan& oPlan, const Target& oTarget, const BitmapNumber
     const ManagerPointer poTo(oTarget.GetRaster().GetOverviewManager());
     const std::string name = oPlan.GetSource(0).GetName();
     if (poTo == nullptr && !oLevels.empty())
-        return Target::Warn(name + ": its levels are not kept: the format has none");
+    {
+        const std::string format = oTarget.Get().GetFileFormat()->GetShortName();
+        if (!DatasetManager::GetInstance()->GetCapabilities(format).IsSupported(CAPABILITY_MAKES_LEVELS))
+            Target::Warn(name + ": its levels are not kept: the format has none");
+        return;
+    }
     const PixelWindow& oWindow = oPlan.GetWindow();
     std::erase_if(oLevels,
                   [&](unsigned int nLevel) { return nLevel < 2 || nLevel >= std::max(oWindow.width, oWindow.height); });

@@ -3,7 +3,9 @@
 #include "toolkit/core/core.h"
 #include "toolkit/exceptions/exceptions.h"
 
+#include <filesystem>
 #include <mutex>
+#include <system_error>
 
 #include <dlfcn.h>
 
@@ -13,14 +15,15 @@ namespace krv::plugins::gdball
 namespace
 {
 
-// Beside the library that holds this code.
+// Beside the library that holds this code, whatever links lead there.
 std::string FindLibrary()
 {
     Dl_info oInfo = {};
-    std::string path;
+    std::error_code oNone;
+    std::filesystem::path oSelf;
     if (dladdr(reinterpret_cast<const void*>(&HasPictures), &oInfo) != 0 && oInfo.dli_fname != nullptr)
-        path = oInfo.dli_fname;
-    return path.substr(0, path.rfind('/') + 1) + "gdballpictures.so";
+        oSelf = std::filesystem::weakly_canonical(oInfo.dli_fname, oNone);
+    return (oSelf.parent_path() / "gdballpictures.so").string();
 }
 
 } // namespace

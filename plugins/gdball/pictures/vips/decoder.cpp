@@ -83,6 +83,12 @@ bool HasPages(PictureKind eKind)
 
 Decoder::Decoder(Picture& oPicture) : moPicture(oPicture)
 {
+    // Their libraries want the file in memory.
+    const bool bLoaded = oPicture.meKind == PictureKind::eGif || oPicture.meKind == PictureKind::eWebp;
+    if (bLoaded && oPicture.mpoFile->GetSize() > MOST_WHOLE)
+        throw FileFormatException(oPicture.mpoFile->GetName(),
+                                  oPicture.mpoFile->GetName() + ": a " + GetPictureName(oPicture.meKind) +
+                                      " file of more than " + std::to_string(MOST_WHOLE >> 20) + " MiB is not read");
     Listener oListener(oPicture.mpoFile->GetName(), oPicture.moSaid);
     const std::string trouble = std::string("the ") + GetPictureName(oPicture.meKind) + " picture cannot be opened";
     mpoOperation.reset(NewLoader(oPicture.meKind));
@@ -144,6 +150,7 @@ void Decoder::Fail(Listener& oListener, const std::string& what) const
 
 void Decoder::CheckMemory() const
 {
+    const std::string& name = moPicture.mpoFile->GetName();
     const std::uint64_t nRow = VIPS_IMAGE_SIZEOF_LINE(mpoImage.get());
     const Claims& oClaims = moPicture.moClaims;
     const std::uint64_t nWhole = !oClaims.mbWhole              ? 0
@@ -151,7 +158,6 @@ void Decoder::CheckMemory() const
                                                                : nRow * static_cast<std::uint64_t>(mpoImage->Ysize);
     if (nWhole <= MOST_WHOLE && nRow * KEPT_ROWS <= MOST_ROWS)
         return;
-    const std::string& name = moPicture.mpoFile->GetName();
     throw FileFormatException(
         name, name + ": " + std::to_string(mpoImage->Xsize) + " x " + std::to_string(mpoImage->Ysize) +
                   " pixels of such a " + GetPictureName(moPicture.meKind) + " picture take more than " +
