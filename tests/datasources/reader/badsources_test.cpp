@@ -90,7 +90,9 @@ public:
     unsigned int GetTileWidth() const override { return meLie == eTiles ? 0 : DerivedReader::GetTileWidth(); }
     IOverviewReaderAccessor* GetOverviewReaderAccessor() override
     {
-        return meLie == eLevels ? new BadLevels() : GetSource().GetOverviewReaderAccessor();
+        if (meLie == eLevels)
+            return new BadLevels();
+        return meLie == eNone ? GetSource().GetOverviewReaderAccessor() : nullptr; // which would tell the truth
     }
     using DerivedReader::ReadRaster;
     void ReadRaster(Raster* poRaster) override
