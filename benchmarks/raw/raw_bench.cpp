@@ -10,6 +10,7 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/iomanager/datasetmanager.h"
+#include "datasources/metadata/auxiliarydata.h"
 #include "datasources/overviews/overviewbuilder.h"
 #include "datasources/reader/basicoverviewreaderaccessor.h"
 #include "datasources/reader/basicreader.h"

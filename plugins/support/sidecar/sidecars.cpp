@@ -22,7 +22,9 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <filesystem>
 #include <functional>
+#include <system_error>
 #include <utility>
 
 namespace krv::plugins::support
@@ -251,6 +253,9 @@ void Sidecars::LoadMasks()
     moMaskName = mbNone ? std::string() : FindAppended(moFileName, MASK_ENDING);
     if (moMaskName->empty())
         return;
+    std::error_code oNone;
+    if (std::filesystem::equivalent(moFileName, *moMaskName, oNone))
+        return Complain(*moMaskName, "it is the image itself");
     try
     {
         mpoMask.reset(krv::datasources::DatasetManager::GetInstance()->Open(*moMaskName, eReadOnly));
