@@ -237,7 +237,7 @@ TEST(Pictures, DamageIsAnErrorOrDoesNoHarm)
     }
 }
 
-// Heads without pixels that claim as many as the formats know.
+// Heads without pixels that claim as many as the formats know, and bits that libvips takes for one number.
 TEST(Pictures, GreatClaimsAreRefusedAtOnce)
 {
     const TempFolder oFolder;
@@ -265,7 +265,8 @@ TEST(Pictures, GreatClaimsAreRefusedAtOnce)
         {"a.gif", "GIF89a"s + shortSides + "\x80\x00\x00\x00\x00\x00\xff\xff\xff,\x00\x00\x00\x00"s + shortSides +
                       "\x00\x02\x02\x44\x01\x00;"s},
         {"a.ppm", "P6\n65500 65500\n255\n" + std::string(100, 'x')},
-        {"b.ppm", "P3\n65500 65500\n255\n1 2 3"}};
+        {"b.ppm", "P3\n65500 65500\n255\n1 2 3"},
+        {"bits.pbm", "P1\n4 2\n1011\n0000\n"}};
     for (const auto& [name, bytes] : FILES)
     {
         Samples oSamples;
@@ -324,7 +325,7 @@ TEST(Pictures, EachTypeKeepsWhatItHoldsAndRefusesTheRest)
                           {"WEBP", krv::gobs::eDT_8U, 3, ""},
                           {"ppm", krv::gobs::eDT_8U, 3, ""},
                           {"pgm", krv::gobs::eDT_16U, 1, ""},
-                          {"pfm", krv::gobs::eDT_32R, 3, ""},
+                          {"pgm", krv::gobs::eDT_32R, 1, "PNM pictures hold 8U, 16U, not 32R"},
                           {"png", krv::gobs::eDT_32R, 1, "PNG pictures hold 8U, 16U, not 32R"},
                           {"png", krv::gobs::eDT_8U, 5, "1, 2, 3 or 4 channels, not 5"},
                           {"jpg", krv::gobs::eDT_16U, 1, "JPEG pictures hold 8U, not 16U"},

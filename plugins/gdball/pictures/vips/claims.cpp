@@ -127,7 +127,7 @@ Claims ReadPnmClaims(const File& oFile)
     return oClaims;
 }
 
-// Numbers between blanks; bits of PBM need none.
+// Numbers between blanks. libvips takes bits of PBM that stand without any, as they may, for one large number.
 void CheckText(const File& oFile, const PnmHeader& oHeader)
 {
     constexpr std::size_t PIECE = std::size_t{1} << 20;
@@ -146,10 +146,12 @@ void CheckText(const File& oFile, const PnmHeader& oHeader)
             const bool bDigit = nLetter >= '0' && nLetter <= '9';
             if (!bDigit && nLetter != ' ' && (nLetter < '\t' || nLetter > '\r'))
                 Refuse(oFile, "byte " + std::to_string(nAt + nByte) + " is no part of a sample");
-            const bool bNew = bDigit && (!bInside || oHeader.IsBits());
+            const bool bNew = bDigit && !bInside;
             nValue = bNew ? nLetter - '0' : bDigit ? std::min(nValue * 10 + (nLetter - '0'), 99999u) : nValue;
             nFound += bNew ? 1 : 0;
-            bInside = bDigit && !oHeader.IsBits();
+            if (bInside && bDigit && oHeader.IsBits())
+                Refuse(oFile, "bits without blanks between them are not read");
+            bInside = bDigit;
             if (bDigit && nValue > nMost)
                 Refuse(oFile, "the sample at byte " + std::to_string(nAt + nByte) + " is larger than the maximum");
         }

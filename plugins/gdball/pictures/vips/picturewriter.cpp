@@ -35,13 +35,13 @@ const Limits& GetLimits(PictureKind eKind)
     static const std::vector<Limits> LIMITS = {{PictureKind::ePng, {eDT_8U, eDT_16U}, {1, 2, 3, 4}, 1000000},
                                                {PictureKind::eJpeg, {eDT_8U}, {1, 3}, 65500},
                                                {PictureKind::eWebp, {eDT_8U}, {3, 4}, 16383},
-                                               {PictureKind::ePnm, {eDT_8U, eDT_16U, eDT_32R}, {1, 3}, 10000000}};
+                                               {PictureKind::ePnm, {eDT_8U, eDT_16U}, {1, 3}, 10000000}};
     return *std::find_if(LIMITS.begin(), LIMITS.end(), [eKind](const Limits& oOne) { return oOne.meKind == eKind; });
 }
 
 VipsBandFormat GetFormat(const DataType& oType)
 {
-    return oType.IsReal() ? VIPS_FORMAT_FLOAT : oType.GetBits() == 8 ? VIPS_FORMAT_UCHAR : VIPS_FORMAT_USHORT;
+    return oType.GetBits() == 8 ? VIPS_FORMAT_UCHAR : VIPS_FORMAT_USHORT;
 }
 
 // The waiting pixels as libvips asks for them, from several threads.
