@@ -205,7 +205,7 @@ public:
         Compare("write, synchronised every 64 tiles", true, true, 0.85);
         const double nSize = static_cast<double>(std::filesystem::file_size(moNative));
         PrintRow("size of a new file over its pixels, at most", nSize / static_cast<double>(moImage.GetBytes()), 1.005);
-        Compare("rewrite", false, false, 0);
+        Compare("rewrite as one state, in other room", false, false, 0);
         Compare("rewrite, synchronised every 64 tiles", false, true, 0.78);
     }
 

@@ -54,6 +54,7 @@ constexpr Kind KINDS[] = {
     {0, "WIDTH\t"sv, RSC},
     {0, "Gamma DIFF&GEO"sv, PAR},
     {0, "Gamma Interferometric SAR Processor"sv, PAR},
+    {0, "\x8BKRVDSK\r\n\x1A\n\0"sv, "a native file of the toolkit"},
     {0, "DEMO1\n"sv, "a DEMO file"},
     {0, "<?xml"sv, "an XML document"},
     {0, "<!DOCTYPE html"sv, "a web page: was the download redirected?"},

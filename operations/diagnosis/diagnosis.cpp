@@ -216,8 +216,10 @@ void ReadEnds(IRasterIO& oIO)
 std::string DescribeOpened(IDataset& oDataset)
 {
     const auto* const poRaster = dynamic_cast<IRasterDataset*>(&oDataset);
-    if (poRaster == nullptr || poRaster->GetChanCount() == 0)
+    if (poRaster == nullptr)
         return "it opens, and holds no image";
+    if (poRaster->GetChanCount() == 0)
+        return fmt::format("it opens: {} x {} pixels, no channels", poRaster->GetWidth(), poRaster->GetHeight());
     ReadEnds(oDataset, 1);
     ReadEnds(oDataset, poRaster->GetChanCount());
     return fmt::format("it opens: {} x {} pixels, {} channel{}", poRaster->GetWidth(), poRaster->GetHeight(),
@@ -252,7 +254,8 @@ void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Findin
                 if (poLevels == nullptr || poLevels->GetLevels().empty())
                     std::unique_ptr<IDataset>(
                         DatasetManager::GetInstance()->OpenFormat("GDBALL", oDataset.GetName(), eReadOnly));
-                for (const unsigned int nLevel : poLevels ? poLevels->GetLevels() : std::vector<unsigned int>())
+                const bool bPixels = poLevels != nullptr && poRaster->GetChanCount() != 0;
+                for (const unsigned int nLevel : bPixels ? poLevels->GetLevels() : std::vector<unsigned int>())
                     ReadEnds(*std::unique_ptr<IRasterIO>(poLevels->GetOverviewIO(nLevel, {1})));
             });
     if (auto* const poBitmaps = dynamic_cast<IBitmapDataset*>(&oDataset); poBitmaps != nullptr)

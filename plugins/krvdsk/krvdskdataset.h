@@ -114,7 +114,8 @@ public:
     std::vector<std::string> Verify(const Progress& oProgress) override;
 
     // Of files whose channels are stored in one way: of one type, all together or each by itself, none of them deleted
-    // or linked. Others say so by mbReadable and take no blocks. Checksums are compared with what is read.
+    // or linked. Others say so by mbReadable and take no blocks. Checksums are compared with what is read. A linked
+    // file that shows all channels of the other one, and no others, hands out the blocks of that.
     krv::datasources::EncodedForm GetEncodedForm(unsigned int nLevel) override;
     bool ReadEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock,
                      std::vector<unsigned char>& oBytes) override;
@@ -180,6 +181,7 @@ private:
     // Everything that the state names, but for its root.
     void ForEachPiece(const std::function<void(const Entry& oEntry, const std::string& what)>& oAction,
                       const TileTable::Complain& oComplain);
+    krv::datasources::IEncodedBlocks* FindLinkedBlocks(unsigned int nLevel) const;
     // Throws DataException for a level that does not exist.
     ImageSize GetLevelSize(unsigned int nLevel, const Place& oPlace) const;
     CodedTile FindTile(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock, const Place& oPlace) const;

@@ -1,7 +1,7 @@
 // The tiles of a native file as bytes: the facets IEncodedBlocks and IBlockEncoding of its dataset.
+#include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/metadata/levelbook.h"
 #include "plugins/krvdsk/krvdskdataset.h"
-#include "plugins/support/codec/checksum.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -124,6 +124,21 @@ private:
 
 } // namespace
 
+// Of a linked file that shows all of another one as it is.
+krv::datasources::IEncodedBlocks* KrvdskDataset::FindLinkedBlocks(unsigned int nLevel) const
+{
+    const Catalogue& oCatalogue = GetCatalogue();
+    if (oCatalogue.moLinked.empty() || !oCatalogue.moPlanes.empty() || oCatalogue.moLevels.contains(nLevel))
+        return nullptr;
+    for (std::size_t nAt = 0; nAt < oCatalogue.moLinked.size(); ++nAt)
+        if (oCatalogue.moLinked[nAt].mnNumber != nAt + 1)
+            return nullptr;
+    const auto* const poRaster = mpoLink->Find<krv::datasources::IRasterDataset>();
+    return poRaster != nullptr && poRaster->GetChanCount() == oCatalogue.moLinked.size()
+               ? mpoLink->Find<krv::datasources::IEncodedBlocks>()
+               : nullptr;
+}
+
 ImageSize KrvdskDataset::GetLevelSize(unsigned int nLevel, const Place& oPlace) const
 {
     GetImage(oPlace);
@@ -137,8 +152,19 @@ ImageSize KrvdskDataset::GetLevelSize(unsigned int nLevel, const Place& oPlace) 
 // is what others call strips.
 EncodedForm KrvdskDataset::GetEncodedForm(unsigned int nLevel)
 {
-    const ImageSize oSize = GetLevelSize(nLevel, Place::Current());
+    const Place oPlace = Place::Current();
+    GetImage(oPlace);
     const Catalogue& oCatalogue = GetCatalogue();
+    if (auto* const poTheirs = FindLinkedBlocks(nLevel))
+        return poTheirs->GetEncodedForm(nLevel);
+    ImageSize oSize;
+    if (oCatalogue.moLinked.empty() || nLevel == 1)
+        oSize = GetLevelSize(nLevel, oPlace);
+    else
+    {
+        const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(GetOverviewManager());
+        oSize = {poLevels->GetLevelWidth(nLevel), poLevels->GetLevelHeight(nLevel)};
+    }
     EncodedForm oForm;
     oForm.mbReadable = HasOneForm(oCatalogue);
     oForm.moCodec = GetCodingName(oCatalogue.meCoding);
@@ -190,6 +216,8 @@ KrvdskDataset::CodedTile KrvdskDataset::FindTile(unsigned int nLevel, const Bloc
 
 bool KrvdskDataset::ReadEncoded(unsigned int nLevel, const BlockNumber& oBlock, std::vector<unsigned char>& oBytes)
 {
+    if (auto* const poTheirs = FindLinkedBlocks(nLevel))
+        return poTheirs->ReadEncoded(nLevel, oBlock, oBytes);
     const CodedTile oAt = FindTile(nLevel, oBlock, Place::Current());
     if (mpoWriter)
         mpoWriter->StoreHeld();
@@ -204,8 +232,7 @@ bool KrvdskDataset::ReadEncoded(unsigned int nLevel, const BlockNumber& oBlock, 
     if (oEntry.mnBytes > oAt.mnMost || (oAt.mbPlain && oEntry.mnBytes != oAt.mnMost))
         mpoStore->Fail(what + ": is damaged: it has " + std::to_string(oEntry.mnBytes) + " bytes");
     oBytes.resize(oEntry.mnBytes);
-    mpoStore->GetFile().Read(oEntry.mnOffset, oBytes.data(), oBytes.size());
-    if (codec::Checksum(0, oBytes.data(), oBytes.size()) != oEntry.mnChecksum)
+    if (mpoStore->ReadSummed(oEntry.mnOffset, oBytes.data(), oBytes.size()) != oEntry.mnChecksum)
         mpoStore->Fail(what + ": is damaged: its checksum is wrong");
     return true;
 }
@@ -284,7 +311,7 @@ bool KrvdskDataset::SetEncodedForm(unsigned int nLevel, const EncodedForm& oForm
     oWriter.StoreHeld();
     Catalogue& oCatalogue = oWriter.GetCatalogue();
     GetLevelSize(nLevel, oPlace);
-    for (const std::shared_ptr<Plane>& poPlane : oCatalogue.moPlanes)
+    for (const std::shared_ptr<Plane>& poPlane : nLevel == 1 ? oCatalogue.moPlanes : oCatalogue.GetLevelPlanes())
         if (!poPlane->moTables.at(nLevel)->IsEmpty())
             Refuse("blocks are stored already", oPlace);
     if (!krv::datasources::IsLevelSize(GetWidth(), oForm.mnWidth, nLevel) ||
@@ -346,7 +373,7 @@ IBlockEncoder* KrvdskDataset::MakeBlockEncoder(unsigned int nLevel)
     GetWriter("blocks cannot be encoded", Place::Current());
     const EncodedForm oForm = GetEncodedForm(nLevel);
     const Catalogue& oCatalogue = GetCatalogue();
-    if (!oForm.mbReadable)
+    if (!HasOneForm(oCatalogue))
         return nullptr;
     return new TileEncoder(*oCatalogue.moPlanes.front(), oForm, {oCatalogue.mnBlockWidth, oCatalogue.mnBlockHeight},
                            static_cast<unsigned int>(oCatalogue.moPlanes.size()));

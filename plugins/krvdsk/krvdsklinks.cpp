@@ -186,6 +186,10 @@ void KrvdskDataset::TakeBitmap(unsigned int nBitmap)
     IBitmapDataset* const poTheirs = FindLinkedBitmap(nBitmap);
     if (poTheirs == nullptr)
         return;
+    if (oWriter.GetCatalogue().moSegments.contains(nBitmap))
+        Refuse("the number of bitmap " + std::to_string(nBitmap) + " of " + mpoLink->GetName() +
+                   " is that of something else here",
+               oPlace);
     Segment oSegment;
     oSegment.moKind = Segment::BITMAP;
     oSegment.mpoPlane = oWriter.GetCatalogue().MakeBitmapPlane();

@@ -1,5 +1,10 @@
 // The command as users run it, on files made here.
 
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/ioverviewmanager.h"
+#include "datasources/interfaces/irasterdataset.h"
+#include "datasources/iomanager/datasetmanager.h"
+#include "gobs/raster/datatype.h"
 #include "tests/support/demofile.h"
 #include "tests/support/tiffwriter.h"
 #include "tests/tools/programrun.h"
@@ -223,6 +228,25 @@ TEST(Command, ForeignBytesInMetadataKeepTheJsonValid)
     ASSERT_EQ(oRun.code, 0) << oRun.errors;
     EXPECT_NE(oRun.Json()["metadata"].dump().find(" end"), std::string::npos);
     EXPECT_EQ(RunKrv({"info", file}).output.find('\x01'), std::string::npos);
+}
+
+TEST(Command, ANativeFileWithoutChannelsIsSound)
+{
+    using namespace krv::datasources;
+    const TempFolder oFolder;
+    const std::string file = oFolder.File("empty.krv");
+    {
+        const std::unique_ptr<IDataset> poNew(DatasetManager::GetInstance()->NewDataset(file, "KRVDSK", ""));
+        auto& oRaster = dynamic_cast<IRasterDataset&>(*poNew);
+        oRaster.Create(40, 30, {krv::gobs::eDT_8U});
+        std::unique_ptr<IOverviewManager>(oRaster.GetOverviewManager())->CreateLevel(2);
+        oRaster.DeleteChannel(1);
+        poNew->Close();
+    }
+    const auto oDoctor = RunKrv({"doctor", file});
+    EXPECT_EQ(oDoctor.code, 0) << oDoctor.output;
+    EXPECT_NE(oDoctor.output.find("40 x 30 pixels, no channels"), std::string::npos) << oDoctor.output;
+    EXPECT_NE(oDoctor.output.find("begins like a native file"), std::string::npos) << oDoctor.output;
 }
 
 // What spoils a part leaves the rest to be shown, and `doctor` names it.

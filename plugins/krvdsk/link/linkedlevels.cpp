@@ -111,8 +111,8 @@ void LinkedLevels::SetValid(unsigned int nChannel, unsigned int nLevel, bool bVa
 {
     if (const unsigned int nSource = FindSource(nChannel, nLevel); nSource != 0)
     {
-        if (mpoTheirs->IsValid(nSource, nLevel) == bValid)
-            return;
+        if (bValid && mpoTheirs->IsValid(nSource, nLevel))
+            return; // otherwise it is going to change
         moOwner.moTakeOver(nChannel, nLevel);
         if (!Has(mpoOwn.get(), nLevel))
             mpoOwn->CreateLevel(nLevel);

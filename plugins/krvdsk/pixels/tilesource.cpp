@@ -161,6 +161,9 @@ void TileSource::ReadPlain(Work& oWork, const Spot& oSpot, const TileTable::Tile
     const ImageSize oStored = oCodec.GetStoredSize(oSpot.moRect.mnWidth, oSpot.moRect.mnHeight);
     const support::PixelRect oWhole{0, 0, oStored.mnWidth, oStored.mnHeight};
     const std::size_t nWholePitch = oCodec.GetStoredRowBytes(oWhole.mnWidth);
+    if (oCodec.IsWhole() && !oTile.mbVerified && oPart == oWhole && nPitch == nWholePitch)
+        return Verify(oWork, oSpot, oTile,
+                      moOrigin.mpoStore->ReadSummed(oTile.moEntry.mnOffset, pTarget, nPitch * oWhole.mnHeight));
     if (oCodec.IsWhole() && (oTile.mbVerified || oPart == oWhole))
     {
         ReadPlainRows(oWork, oSpot, oTile, oPart, pTarget, nPitch);
@@ -172,10 +175,12 @@ void TileSource::ReadPlain(Work& oWork, const Spot& oSpot, const TileTable::Tile
     const support::PixelRect& oRead = oTile.mbVerified ? oPart : oWhole;
     const std::size_t nReadPitch = oCodec.GetStoredRowBytes(oRead.mnWidth);
     unsigned char* pRead = moStored.Get(nReadPitch * oRead.mnHeight);
-    ReadPlainRows(oWork, oSpot, oTile, oRead, pRead, nReadPitch);
-    if (!oTile.mbVerified)
+    if (oTile.mbVerified)
+        ReadPlainRows(oWork, oSpot, oTile, oRead, pRead, nReadPitch);
+    else
     {
-        Verify(oWork, oSpot, oTile, codec::Checksum(0, pRead, nReadPitch * oRead.mnHeight));
+        Verify(oWork, oSpot, oTile,
+               moOrigin.mpoStore->ReadSummed(oTile.moEntry.mnOffset, pRead, nReadPitch * oRead.mnHeight));
         pRead += oPart.mnY * nReadPitch + oCodec.GetStoredRowBytes(oPart.mnX);
     }
     if (oCodec.IsWhole())
@@ -190,9 +195,10 @@ void TileSource::ReadCoded(Work& oWork, const Spot& oSpot, const TileTable::Tile
 {
     const Entry& oEntry = oTile.moEntry;
     unsigned char* pStored = moStored.Get(oEntry.mnBytes);
-    moOrigin.mpoStore->GetFile().Read(oEntry.mnOffset, pStored, oEntry.mnBytes);
-    if (!oTile.mbVerified)
-        Verify(oWork, oSpot, oTile, codec::Checksum(0, pStored, oEntry.mnBytes));
+    if (oTile.mbVerified)
+        moOrigin.mpoStore->GetFile().Read(oEntry.mnOffset, pStored, oEntry.mnBytes);
+    else
+        Verify(oWork, oSpot, oTile, moOrigin.mpoStore->ReadSummed(oEntry.mnOffset, pStored, oEntry.mnBytes));
     const char* const pCause =
         oWork.moCodec.Decode(pStored, oEntry.mnBytes, oSpot.moRect.mnWidth, oSpot.moRect.mnHeight, pTarget, nPitch);
     if (pCause != nullptr)

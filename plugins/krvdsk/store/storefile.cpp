@@ -5,6 +5,7 @@
 #include "plugins/support/file/numbers.h"
 #include "toolkit/exceptions/exceptions.h"
 
+#include <algorithm>
 #include <array>
 #include <bit>
 #include <cstring>
@@ -20,6 +21,8 @@ namespace
 
 constexpr std::string_view ROOT_NAME = "ROOT";
 constexpr std::size_t CHECKED_BYTES = Root::BYTES - 4;
+// What was read lies in the processor's second cache still.
+constexpr std::size_t SUMMED_BYTES = std::size_t{256} << 10;
 
 std::string VersionText(unsigned int nVersion, unsigned int nRevision)
 {
@@ -114,14 +117,25 @@ void StoreFile::CheckPlace(const Entry& oEntry, const std::string& what) const
              std::to_string(oEntry.mnOffset) + " lie outside of the file");
 }
 
+std::uint32_t StoreFile::ReadSummed(std::uint64_t nOffset, unsigned char* pTarget, std::size_t nBytes) const
+{
+    std::uint32_t nChecksum = 0;
+    for (std::size_t nAt = 0; nAt < nBytes; nAt += SUMMED_BYTES)
+    {
+        const std::size_t nPart = std::min(SUMMED_BYTES, nBytes - nAt);
+        mpoFile->Read(nOffset + nAt, pTarget + nAt, nPart);
+        nChecksum = codec::Checksum(nChecksum, pTarget + nAt, nPart);
+    }
+    return nChecksum;
+}
+
 std::vector<unsigned char> StoreFile::Read(const Entry& oEntry, const std::string& what) const
 {
     CheckPlace(oEntry, what);
     if (oEntry.mnBytes > LARGEST_RECORD)
         Fail(what + " is damaged: " + std::to_string(oEntry.mnBytes) + " bytes are too many");
     std::vector<unsigned char> oBytes(oEntry.mnBytes);
-    mpoFile->Read(oEntry.mnOffset, oBytes.data(), oBytes.size());
-    if (codec::Checksum(0, oBytes.data(), oBytes.size()) != oEntry.mnChecksum)
+    if (ReadSummed(oEntry.mnOffset, oBytes.data(), oBytes.size()) != oEntry.mnChecksum)
         Fail(what + " is damaged: the checksum of the bytes at offset " + std::to_string(oEntry.mnOffset) +
              " is wrong");
     return oBytes;

@@ -72,6 +72,8 @@ public:
     void CheckPlace(const Entry& oEntry, const std::string& what) const;
     // The bytes of a record, with their checks.
     std::vector<unsigned char> Read(const Entry& oEntry, const std::string& what) const;
+    // Reads bytes, and sums them up while they are near by.
+    std::uint32_t ReadSummed(std::uint64_t nOffset, unsigned char* pTarget, std::size_t nBytes) const;
     // what: a place in the file and what is wrong there.
     [[noreturn]] void Fail(const std::string& what) const;
 

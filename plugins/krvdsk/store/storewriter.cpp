@@ -20,6 +20,9 @@ constexpr int COMPACTIONS = 3;
 // Moved without asking whether so much was written.
 constexpr std::uint64_t LITTLE_BYTES = std::uint64_t{64} << 20;
 
+// The disk is told to begin with so many at a time.
+constexpr std::uint64_t BEGUN_BYTES = std::uint64_t{1} << 20;
+
 } // namespace
 
 ITileHolder::~ITileHolder() = default;
@@ -148,7 +151,31 @@ support::Extent StoreWriter::WritePiece(const void* pBytes, std::size_t nBytes)
     }
     mpoStore->SetEnd(std::max(mpoStore->GetEnd(), oRoom.mnOffset + nBytes));
     mnWritten += nBytes;
+    if (mbOften)
+        BeginFlush(oRoom);
     return oRoom;
+}
+
+// Whoever synchronises often waits for the disk each time: it begins with the pieces as they come.
+void StoreWriter::BeginFlush(const support::Extent& oPiece)
+{
+    const bool bNext = oPiece.mnOffset == moUnflushed.GetEnd();
+    const auto Begin = [this]
+    {
+        if (moUnflushed.mnBytes != 0)
+            GetFile()->BeginFlush(moUnflushed.mnOffset, moUnflushed.mnBytes);
+    };
+    if (bNext)
+        moUnflushed.mnBytes += oPiece.mnBytes;
+    else
+    {
+        Begin();
+        moUnflushed = oPiece;
+    }
+    if (moUnflushed.mnBytes < BEGUN_BYTES)
+        return;
+    Begin();
+    moUnflushed = {oPiece.GetEnd(), 0, 0};
 }
 
 void StoreWriter::Release(const Entry& oEntry, std::uint64_t nGeneration)
@@ -287,6 +314,7 @@ void StoreWriter::Commit()
     // Nobody reads what has no name yet.
     mpoSpace->Reuse(IsNamed() ? GetFile()->FindHeld() : support::Space::Roots(std::in_place));
     mbChanged = false;
+    mbOften = true;
 }
 
 // What was written is on the disk before the one root that makes it the file's, and that before anything of the former
@@ -361,6 +389,8 @@ void StoreWriter::RenewRecords(std::uint64_t nIdealEnd)
             oBlob.Set(oBlob.Get(*mpoStore, "a record"));
     };
     Renew(moCatalogue.moRecord);
+    if (moDirectory.mnOffset >= nIdealEnd)
+        Touch(); // it is written anew with each state
     for (auto& [nNumber, oSegment] : moCatalogue.moSegments)
         Renew(oSegment.moBytes);
 }

@@ -71,6 +71,7 @@ protected:
 private:
     void UseSpace(std::uint64_t nEnd);
     void FindUsed();
+    void BeginFlush(const support::Extent& oPiece);
     support::Extent WritePiece(const void* pBytes, std::size_t nBytes);
     void Release(const Entry& oEntry, std::uint64_t nGeneration);
     void WriteBlob(Blob& oBlob);
@@ -91,6 +92,8 @@ private:
     std::uint64_t mnNextGeneration = 1; // of the file
     std::uint64_t mnCommittedSize = 0;  // of the file with all that its committed state may use
     std::uint64_t mnWritten = 0;        // bytes, since the file was opened
+    support::Extent moUnflushed;        // written side by side since the last BeginFlush
+    bool mbOften = false;               // the file was brought to the disk before its end
     bool mbChanged = false;
 };
 

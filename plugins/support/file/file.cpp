@@ -311,6 +311,11 @@ void File::Flush(const Place& oPlace)
         throw IOException(moName, moName + ": was removed or replaced while it was being written", oPlace);
 }
 
+void File::BeginFlush(std::uint64_t nOffset, std::uint64_t nBytes) const noexcept
+{
+    ::sync_file_range(mnDescriptor, static_cast<off_t>(nOffset), static_cast<off_t>(nBytes), SYNC_FILE_RANGE_WRITE);
+}
+
 void File::CutBack(std::uint64_t nBytes) noexcept
 {
     struct stat oStatus = {};

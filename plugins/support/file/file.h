@@ -76,6 +76,8 @@ public:
     // Makes sure that what was written reaches the disk. Throws when the file lost its name meanwhile: nobody would
     // find it again.
     void Flush(const Place& oPlace = Place::Current());
+    // Has the system begin with what was written there: Flush has the less to wait for.
+    void BeginFlush(std::uint64_t nOffset, std::uint64_t nBytes) const noexcept;
 
     // Cuts off what this object wrote behind nBytes, unless somebody else wrote there too. Failures leave the file as
     // it is.

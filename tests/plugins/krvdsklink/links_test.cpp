@@ -195,6 +195,7 @@ TEST_F(LinkTest, EveryRealFileIsSeenThroughItsLink)
         auto& oFrom = As<IRasterDataset>(*poSource);
         auto& oTo = As<IRasterDataset>(*poLink);
         ASSERT_EQ(oTo.GetChanCount(), oFrom.GetChanCount()); // single bits come as bytes
+        EXPECT_TRUE(As<IEncodedBlocks>(*poLink).GetEncodedForm(1) == As<IEncodedBlocks>(*poSource).GetEncodedForm(1));
         const krv::gobs::DataType oType = GetType(oFrom, 1);
         const std::size_t nBytes = oType.GetValueBits() / 8;
         for (unsigned int nChannel = 1; nChannel <= oFrom.GetChanCount(); ++nChannel)
@@ -349,6 +350,8 @@ TEST_F(LinkTest, LevelsAreThoseOfBoth)
     EXPECT_EQ(oBoth[0], 55);
     EXPECT_EQ(oBoth[1], 77);
     EXPECT_EQ(poLevels->GetAuxiliaryData(4).GetChannelCount(), 2U);
+    // Blocks are had of the one and of the other, not of both together.
+    EXPECT_FALSE(As<IEncodedBlocks>(*poLink).GetEncodedForm(4).mbReadable);
     // What the link is to say of it is said here, with the pixels that it had.
     poLevels->SetValid(1, 4, false);
     EXPECT_FALSE(poLevels->IsValid(1, 4));
@@ -381,8 +384,9 @@ TEST_F(LinkTest, OverviewsOfALinkedFileAreItsOwn)
         const unsigned int nMask = oBitmaps.CreateBitmap();
         oBitmaps.SetBitmapDescription(nMask, ""); // of valid pixels
         IOPtr(oBitmaps.GetBitmapIO({nMask}))->WriteWindow(0U, 0U, 301U, 277U, oBits.data());
-        // One level is there already, of another method and a side that was rounded down.
+        // Levels are there already: one of another method and a side that was rounded down, one that is out of date.
         const std::unique_ptr<IOverviewManager> poLevels(As<IRasterDataset>(*poSource).GetOverviewManager());
+        poLevels->CreateLevel(2);
         poLevels->CreateLevel(4);
         EncodedForm oForm = As<IEncodedBlocks>(*poSource).GetEncodedForm(4);
         oForm.mnWidth = 75;
