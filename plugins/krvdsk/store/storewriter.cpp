@@ -4,6 +4,7 @@
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
+#include <optional>
 #include <utility>
 
 namespace krv::plugins::krvdsk
@@ -139,7 +140,9 @@ void StoreWriter::Restart() noexcept
 
 support::Extent StoreWriter::WritePiece(const void* pBytes, std::size_t nBytes)
 {
-    const support::Extent oRoom = mpoSpace->Allocate(nBytes);
+    const std::optional<support::Extent> oBefore =
+        mnBound == 0 ? std::nullopt : mpoSpace->AllocateBefore(nBytes, mnBound);
+    const support::Extent oRoom = oBefore ? *oBefore : mpoSpace->Allocate(nBytes);
     try
     {
         GetFile()->Write(oRoom.mnOffset, pBytes, nBytes);
@@ -407,6 +410,7 @@ void StoreWriter::Compact()
         RenewRecords(nEnd - nFree);
         if (!HoldsChanges())
             break;
+        mnBound = nEnd - nFree;
         Commit();
     }
     GetFile()->CutBack(std::max(mpoSpace->CutEnd(), mpoStore->GetRoot().mnFileBytes));
