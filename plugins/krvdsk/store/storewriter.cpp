@@ -18,6 +18,8 @@ constexpr std::uint64_t KEPT_ROOM_PART = 32;
 constexpr std::uint64_t LARGEST_GENERATION = std::uint64_t{1} << 61;
 // A file whose tiles were all moved once may want a second look: what moved made room as well.
 constexpr int COMPACTIONS = 3;
+// How far behind the end that a file is to have records may come to lie, at first.
+constexpr std::uint64_t LITTLE_ROOM = std::uint64_t{64} << 10;
 // Moved without asking whether so much was written.
 constexpr std::uint64_t LITTLE_BYTES = std::uint64_t{64} << 20;
 
@@ -140,9 +142,11 @@ void StoreWriter::Restart() noexcept
 
 support::Extent StoreWriter::WritePiece(const void* pBytes, std::size_t nBytes)
 {
-    const std::optional<support::Extent> oBefore =
-        mnBound == 0 ? std::nullopt : mpoSpace->AllocateBefore(nBytes, mnBound);
-    const support::Extent oRoom = oBefore ? *oBefore : mpoSpace->Allocate(nBytes);
+    std::optional<support::Extent> oLow;
+    for (std::uint64_t nSlack = 0; mnBound != 0 && !oLow && mnBound + nSlack < mpoStore->GetEnd();
+         nSlack = std::max(LITTLE_ROOM, 2 * nSlack))
+        oLow = mpoSpace->AllocateBefore(nBytes, mnBound + nSlack);
+    const support::Extent oRoom = oLow ? *oLow : mpoSpace->Allocate(nBytes);
     try
     {
         GetFile()->Write(oRoom.mnOffset, pBytes, nBytes);

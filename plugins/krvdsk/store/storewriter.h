@@ -92,7 +92,7 @@ private:
     std::uint64_t mnNextGeneration = 1; // of the file
     std::uint64_t mnCommittedSize = 0;  // of the file with all that its committed state may use
     std::uint64_t mnWritten = 0;        // bytes, since the file was opened
-    std::uint64_t mnBound = 0;          // before which pieces go if they can; 0: anywhere
+    std::uint64_t mnBound = 0;          // pieces go before it or soon after; 0: anywhere
     support::Extent moUnflushed;        // written side by side since the last BeginFlush
     bool mbOften = false;               // the file was brought to the disk before its end
     bool mbChanged = false;
