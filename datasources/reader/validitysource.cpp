@@ -105,24 +105,40 @@ unsigned int FindAlpha(const AuxiliaryData& oMetadata)
 ValiditySource::ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels, BkgdRule eRule,
                                bool bNoData)
 {
-    const Place oPlace = Place::Current();
+    FindSize(poDataset);
+    FindAll(*poDataset, poDataset->ReadAuxiliaryData(), oChannels, eRule, bNoData);
+}
+
+ValiditySource::ValiditySource(IDataset* poDataset, const AuxiliaryData& oRecord,
+                               const std::vector<unsigned int>& oChannels, BkgdRule eRule, bool bNoData)
+{
+    FindSize(poDataset);
+    FindAll(*poDataset, oRecord, oChannels, eRule, bNoData);
+}
+
+void ValiditySource::FindSize(IDataset* poDataset, const Place& oPlace)
+{
     if (poDataset == nullptr)
         throw krv::DataException("The dataset is NULL", oPlace);
     const auto& oRasterDataset =
         detail::RequireFacet<IRasterDataset>(poDataset, "This dataset doesn't support Raster.", oPlace);
     mnImageWidth = oRasterDataset.GetWidth();
     mnImageHeight = oRasterDataset.GetHeight();
-    const AuxiliaryData oMetadata = poDataset->ReadAuxiliaryData();
+}
+
+void ValiditySource::FindAll(IDataset& oDataset, const AuxiliaryData& oRecord,
+                             const std::vector<unsigned int>& oChannels, BkgdRule eRule, bool bNoData)
+{
     const std::vector<unsigned int> oListed =
-        oChannels.empty() ? detail::FirstChannels(oMetadata.GetChannelCount()) : oChannels;
-    const unsigned int nAlpha = FindAlpha(oMetadata);
-    FindNoData(oMetadata, bNoData ? oListed : std::vector<unsigned int>(), nAlpha, eRule);
-    FindBitmap(*poDataset);
+        oChannels.empty() ? detail::FirstChannels(oRecord.GetChannelCount()) : oChannels;
+    const unsigned int nAlpha = FindAlpha(oRecord);
+    FindNoData(oRecord, bNoData ? oListed : std::vector<unsigned int>(), nAlpha, eRule);
+    FindBitmap(oDataset);
     const auto oAlpha = std::find(oListed.begin(), oListed.end(), nAlpha);
     if (nAlpha != 0 && oAlpha != oListed.end())
         UseAlphaOfRaster(static_cast<unsigned int>(oAlpha - oListed.begin()) + 1);
     else if (nAlpha != 0)
-        mpoAlphaReader = std::make_unique<BasicReader>(poDataset, std::vector<unsigned int>{nAlpha}, false);
+        mpoAlphaReader = std::make_unique<BasicReader>(&oDataset, std::vector<unsigned int>{nAlpha}, false);
 }
 
 ValiditySource::ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels, unsigned int nWidth,

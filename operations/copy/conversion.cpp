@@ -17,6 +17,7 @@
 #include "operations/copy/detail/copyrecord.h"
 #include "operations/copy/detail/copyvalidity.h"
 #include "operations/copy/detail/keptform.h"
+#include "operations/copy/detail/scaledreader.h"
 #include "operations/copy/detail/storereader.h"
 #include "operations/copy/detail/target.h"
 #include "operations/job/exceptions.h"
@@ -221,22 +222,39 @@ bool HasLevels(const SourceFile& oSource)
     return poLevels != nullptr && !poLevels->GetLevels().empty();
 }
 
-void ConvertPower(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress)
+// A copy of what a reader makes of one file.
+void ConvertByReader(IRasterReader& oReader, const SourceFile& oSource, const CopyRequest& oRequest,
+                     const TargetForm& oForm, const Progress& oProgress)
 {
-    if (oRequest.sources.size() != 1 || oRequest.type || oRequest.promote)
-        throw RequestException("the power is that of one file, and has a type of its own");
-    const SourceFile oSource(oRequest.sources.front());
-    PowerRequest oPower;
-    oPower.moChannels = oRequest.channels.empty() ? oRequest.channels : oSource.CheckChannels(oRequest.channels);
-    TotalPowerRasterReader oReader(&oSource.GetDataset(), false, oPower);
     const PixelWindow oWindow =
         FindWindow(oSource, oRequest.window).value_or(PixelWindow{0, 0, oReader.GetWidth(), oReader.GetHeight()});
     if (oWindow.width == 0 || oWindow.height == 0 || std::uint64_t{oWindow.x} + oWindow.width > oReader.GetWidth() ||
         std::uint64_t{oWindow.y} + oWindow.height > oReader.GetHeight())
         throw RequestException(fmt::format("{}: the window is not inside the image of {} x {} pixels",
                                            oSource.GetName(), oReader.GetWidth(), oReader.GetHeight()));
-    const Target oTarget(TargetLayout{oWindow.width, oWindow.height, {oReader.GetDataType()}}, oForm, oProgress);
+    const std::vector<krv::gobs::DataType> oTypes(oReader.GetChansCount(), oReader.GetDataType());
+    const Target oTarget(TargetLayout{oWindow.width, oWindow.height, oTypes}, oForm, oProgress);
     StoreReader(oReader, oWindow, oTarget, "convert");
+}
+
+void ConvertPower(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress)
+{
+    if (oRequest.sources.size() != 1 || oRequest.type || oRequest.promote || oRequest.noData)
+        throw RequestException("the power is that of one file, and has a type and a no-data value of its own");
+    const SourceFile oSource(oRequest.sources.front());
+    PowerRequest oPower;
+    oPower.moChannels = oRequest.channels.empty() ? oRequest.channels : oSource.CheckChannels(oRequest.channels);
+    TotalPowerRasterReader oReader(&oSource.GetDataset(), false, oPower);
+    ConvertByReader(oReader, oSource, oRequest, oForm, oProgress);
+}
+
+void ConvertScaled(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress)
+{
+    if (oRequest.sources.size() != 1 || oRequest.promote || oRequest.power)
+        throw RequestException("values are scaled of one file, into one type");
+    const SourceFile oSource(oRequest.sources.front(), eReadOnly, oRequest.noData);
+    ScaledReader oReader(oSource, oRequest);
+    ConvertByReader(oReader, oSource, oRequest, oForm, oProgress);
 }
 
 } // namespace
@@ -245,6 +263,8 @@ void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progres
              krv::threading::IExecutor* poExecutor)
 {
     CheckTarget(oRequest.sources, oForm.name);
+    if (oRequest.unscale || !oRequest.scale.empty())
+        return ConvertScaled(oRequest, oForm, oProgress);
     if (oRequest.power)
         return ConvertPower(oRequest, oForm, oProgress);
     const CopyPlan oPlan(oRequest);

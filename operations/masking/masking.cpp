@@ -16,7 +16,7 @@
 #include "operations/job/progress.h"
 #include "operations/masking/detail/polygonplacer.h"
 #include "operations/masking/polygontext.h"
-#include "operations/picture/pngwriter.h"
+#include "operations/picture/picturewriter.h"
 #include "operations/source/fileworkers.h"
 #include "operations/source/sourcefile.h"
 #include "toolkit/core/gglshape.h"

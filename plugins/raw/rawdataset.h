@@ -4,6 +4,7 @@
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/iplaceremoval.h"
 #include "plugins/raw/rawimage.h"
 #include "plugins/raw/rawwriter.h"
 #include "plugins/support/dataset.h"
@@ -35,7 +36,8 @@ class RawDataset : public support::Dataset,
                    public krv::datasources::IGeocodedDataset,
                    public krv::datasources::IPCTDataset,
                    public krv::datasources::IBitmapDataset,
-                   public krv::datasources::IMathModelDataset
+                   public krv::datasources::IMathModelDataset,
+                   public krv::datasources::IPlaceRemoval
 {
 public:
     // Files to be read. Throws krv::FileException kinds that name file and cause.
@@ -61,6 +63,8 @@ public:
     void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;
     const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override;
     void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) override;
+    void RemoveCRS() override { StoreCRS(nullptr, "the reference system cannot be removed", Place::Current()); }
+    void RemoveGeocoding() override { StoreGeocoding(nullptr, "the geocoding cannot be removed", Place::Current()); }
 
     // The colours of classes are table 1, of channel 1.
     std::vector<unsigned int> GetPCTList() const override;
@@ -97,6 +101,8 @@ private:
     bool HasHeader() const { return moImage.moFiles.meKind == RawKind::eEnvi; }
     std::unique_ptr<krv::ogc::cs::ICRS> ReadOwnCRS() const;
     void StoreBeside(support::AuxXml oAuxXml) const;
+    void StoreCRS(const krv::ogc::cs::ICRS* poCRS, const char* pRefusal, const Place& oPlace) const;
+    void StoreGeocoding(const krv::ogc::cs::GeocodingInfo* poInfo, const char* pRefusal, const Place& oPlace);
     void CheckBitmap(unsigned int nBitmap, const Place& oPlace) const;
     HeaderText& GetHeader(const char* pWhat, const Place& oPlace) const;
     void StoreHeader() const;

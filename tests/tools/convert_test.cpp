@@ -80,8 +80,8 @@ json Kept(const std::string& file)
     const auto oRun = RunKrv({"info", file, "--json"});
     EXPECT_EQ(oRun.code, 0) << oRun.errors;
     json oInfo = oRun.Json();
-    for (const char* pName :
-         {"file", "blockWidth", "blockHeight", "overviews", "furtherImages", "unusedBytes", "sidecars"})
+    for (const char* pName : {"file", "blockWidth", "blockHeight", "overviews", "furtherImages", "unusedBytes",
+                              "sidecars", "preferredTile", "storage", "cloudLayout"})
         oInfo.erase(pName);
     if (!oInfo["crs"].is_null())
         oInfo["crs"].erase("wkt");

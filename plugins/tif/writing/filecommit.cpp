@@ -1,4 +1,5 @@
 // FileEditor: how changes become the file's.
+#include "plugins/tif/reading/cloudheader.h"
 #include "plugins/tif/writing/directorybytes.h"
 #include "plugins/tif/writing/fileeditor.h"
 #include "plugins/tif/writing/pagewriter.h"
@@ -32,6 +33,14 @@ std::uint64_t GetPixels(const PageModel& oPage)
     return oPage.moTags.GetNumber(TIFFTAG_IMAGEWIDTH, 0) * oPage.moTags.GetNumber(TIFFTAG_IMAGELENGTH, 0);
 }
 
+bool HasShortBlocks(const std::shared_ptr<PageModel>& poPage)
+{
+    for (std::size_t nAt = 0; nAt < poPage->GetStriles(); ++nAt)
+        if (poPage->moByteCounts[nAt] > UINT32_MAX)
+            return false;
+    return true;
+}
+
 std::vector<Placed> ToPlace(const std::vector<std::shared_ptr<PageModel>>& oPages)
 {
     std::vector<Placed> oPlaced;
@@ -62,8 +71,24 @@ void PlaceDirectory(Placed& oPlaced, const FileHeader& oHeader, std::uint64_t nB
     oPlaced.moCountArray = oSpace.Allocate(oPage.GetStriles() * nWord);
 }
 
-void CopyBlocks(Placed& oPlaced, const support::File& oSource, support::Space& oSpace, support::File& oTarget)
+// Writes in front of a block how long it is, and behind it its last bytes once more: clients that read it with its
+// neighbours see so where it ends, and whether they have all of it.
+void Enclose(const Extent& oBlock, support::File& oTarget)
 {
+    std::vector<unsigned char> oLeader;
+    support::AppendNumber(oLeader, oBlock.mnBytes, CloudHeader::LEADER_BYTES, false);
+    oTarget.Write(oBlock.mnOffset - oLeader.size(), oLeader.data(), oLeader.size());
+    unsigned char aTrailer[CloudHeader::TRAILER_BYTES] = {};
+    const auto nLast = std::min<std::uint64_t>(oBlock.mnBytes, sizeof(aTrailer));
+    oTarget.Read(oBlock.GetEnd() - nLast, aTrailer + sizeof(aTrailer) - nLast, nLast);
+    oTarget.Write(oBlock.GetEnd(), aTrailer, sizeof(aTrailer));
+}
+
+void CopyBlocks(Placed& oPlaced, const support::File& oSource, support::Space& oSpace, support::File& oTarget,
+                bool bEnclosed)
+{
+    const std::uint64_t nBefore = bEnclosed ? CloudHeader::LEADER_BYTES : 0;
+    const std::uint64_t nAround = bEnclosed ? nBefore + CloudHeader::TRAILER_BYTES : 0;
     std::vector<unsigned char> oBytes;
     PageModel& oPage = oPlaced.moPage;
     for (std::size_t nAt = 0; nAt < oPage.GetStriles(); ++nAt)
@@ -72,13 +97,15 @@ void CopyBlocks(Placed& oPlaced, const support::File& oSource, support::Space& o
         oPage.moOffsets[nAt] = 0;
         if (nBytes == 0)
             continue;
-        const Extent oNew = oSpace.Allocate(nBytes);
+        const Extent oNew = {oSpace.Allocate(nBytes + nAround).mnOffset + nBefore, nBytes, 0};
         for (std::uint64_t nDone = 0; nDone < nBytes; nDone += oBytes.size())
         {
             oBytes.resize(std::min<std::uint64_t>(nBytes - nDone, COPY_BYTES));
             oSource.Read(oPlaced.mpOld->moOffsets[nAt] + nDone, oBytes.data(), oBytes.size());
             oTarget.Write(oNew.mnOffset + nDone, oBytes.data(), oBytes.size());
         }
+        if (bEnclosed)
+            Enclose(oNew, oTarget);
         oPage.moOffsets[nAt] = oNew.mnOffset;
     }
 }
@@ -101,20 +128,28 @@ void WriteDirectory(const Placed& oPlaced, const FileHeader& oHeader, std::uint6
 
 // Writes a file anew so that it can be read in few requests over a network: the header, all directories with their
 // values, the image first and its levels from large to small, and then the blocks, those of the smallest level first
-// and in each page in their order. Blocks are copied as they are stored. bSorted: otherwise pages stay in their order.
+// and in each page in their order. Blocks are copied as they are stored. bCloud: with the text that tells clients so;
+// otherwise pages stay in their order.
 // oPages: of the chain, their tags in memory; the first is the image.
 void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, const FileHeader& oHeader,
-                      const support::File& oSource, support::File& oTarget, bool bSorted)
+                      const support::File& oSource, support::File& oTarget, bool bCloud)
 {
     std::vector<Placed> oSorted = ToPlace(oPages);
-    if (bSorted)
+    if (bCloud)
         Sort(oSorted);
-    support::Space oSpace(oTarget.GetName(), oHeader.GetBytes(), oHeader.mbBigTiff ? INT64_MAX : UINT32_MAX,
+    // A block that is longer than a leader can say has none, and so have all others.
+    const bool bEnclosed = bCloud && std::all_of(oPages.begin(), oPages.end(), &HasShortBlocks);
+    const bool bRowMajor =
+        std::all_of(oPages.begin(), oPages.end(),
+                    [](const auto& poPage) { return poPage->moTags.GetNumber(TIFFTAG_PLANARCONFIG, 1) == 1; });
+    const std::string text = bEnclosed ? CloudHeader::Make(bRowMajor) : std::string();
+    support::Space oSpace(oTarget.GetName(), oHeader.GetBytes() + text.size(),
+                          oHeader.mbBigTiff ? INT64_MAX : UINT32_MAX,
                           "the file would pass the limit of 4 GiB of classic TIFF");
     for (Placed& oPlaced : oSorted)
         PlaceDirectory(oPlaced, oHeader, &oPlaced == oSorted.data() ? support::RoomRecord::GetBytes(0) : 0, oSpace);
     for (auto oPlaced = oSorted.rbegin(); oPlaced != oSorted.rend(); ++oPlaced)
-        CopyBlocks(*oPlaced, oSource, oSpace, oTarget);
+        CopyBlocks(*oPlaced, oSource, oSpace, oTarget, bEnclosed);
     for (std::size_t nAt = 0; nAt < oSorted.size(); ++nAt)
         WriteDirectory(oSorted[nAt], oHeader,
                        nAt + 1 < oSorted.size() ? oSorted[nAt + 1].moPage.moDirectory.mnOffset : 0, oTarget);
@@ -126,6 +161,7 @@ void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, con
     oTarget.Write(nRecord, oRecord.Make(oRoot.mnOffset).data(), oRecord.GetBytes());
     unsigned char aHeader[FileHeader::BYTES] = {};
     oHeader.Write(aHeader, oSorted.front().moPage.moDirectory.mnOffset);
+    oTarget.Write(oHeader.GetBytes(), reinterpret_cast<const unsigned char*>(text.data()), text.size());
     oTarget.Write(0, aHeader, oHeader.GetBytes());
 }
 
@@ -306,6 +342,20 @@ void FileEditor::Commit(const std::vector<Written>& oWritten)
         mpoSpace->Reuse(IsNamed() ? GetFile()->FindHeld() : support::Space::Roots(std::in_place));
 }
 
+// Before the first change becomes the file's, its own text says that what it promised does not hold any more.
+void FileEditor::MarkChanged()
+{
+    if (mnCloudBytes == 0 || mbMarked)
+        return;
+    const std::optional<CloudHeader> oCloud = CloudHeader::Read(*GetFile(), moHeader);
+    if (oCloud && !oCloud->mbChanged)
+    {
+        const std::string marked = CloudHeader::MarkChanged(oCloud->moText);
+        GetFile()->Write(moHeader.GetBytes(), reinterpret_cast<const unsigned char*>(marked.data()), marked.size());
+    }
+    mbMarked = true;
+}
+
 // What was written reaches the disk before the one number that makes it the file's, and that before anything of the
 // former state is given up.
 void FileEditor::Publish(const std::vector<Written>& oWritten)
@@ -314,6 +364,7 @@ void FileEditor::Publish(const std::vector<Written>& oWritten)
     const bool bFirst = oFirst.mpPage == moPages.front().get();
     try
     {
+        MarkChanged();
         GetFile()->Flush();
     }
     catch (...)
