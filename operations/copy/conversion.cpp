@@ -15,6 +15,7 @@
 #include "operations/copy/detail/copymodels.h"
 #include "operations/copy/detail/copypixels.h"
 #include "operations/copy/detail/copyrecord.h"
+#include "operations/copy/detail/copystatistics.h"
 #include "operations/copy/detail/copyvalidity.h"
 #include "operations/copy/detail/keptform.h"
 #include "operations/copy/detail/scaledreader.h"
@@ -295,14 +296,18 @@ void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progres
     // LAYOUT=COG means the same to every format: a file laid out for reading over a network has its levels.
     const auto oOptions = ParseOptions(oForm.options);
     const auto oLayout = oOptions.find("LAYOUT");
-    const bool bWanted = oLayout != oOptions.end() && oLayout->second == "COG" && !HasLevels(oPlan.GetSource(0));
+    const bool bCloud = oLayout != oOptions.end() && oLayout->second == "COG";
+    const bool bWanted = bCloud && !HasLevels(oPlan.GetSource(0));
     // Levels that are encoded with loss beside blocks that moved: a mask tells of theirs which pixels are valid.
     auto* const poBitmaps = oTarget.Find<IBitmapDataset>();
     if (bWanted && oTarget.IsLossy() && poBitmaps != nullptr && FindValidityMask(*poBitmaps) == 0 &&
         HasValidityInValues(oPlan))
         WriteValidity(oPlan, oTarget, 0);
-    CopyLevels(oPlan, oTarget, oBitmaps, oPlan.IsWholeFile() && !oPlan.IsCut() && oPlan.AreTypesKept() && !bMask,
-               bWanted);
+    // Levels that were made by another no-data value are none of this copy.
+    CopyLevels(oPlan, oTarget, oBitmaps,
+               oPlan.IsWholeFile() && !oPlan.IsCut() && oPlan.AreTypesKept() && !bMask && !oRequest.noData, bWanted);
+    if (bCloud)
+        AddStatistics(oPlan, oTarget, oRecord);
     oTarget.Get().Close();
 }
 

@@ -4,8 +4,10 @@
 
 #include <algorithm>
 #include <array>
+#include <set>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace krv::operations
 {
@@ -100,11 +102,34 @@ unsigned int MakeRoom(Picture& oPicture, unsigned int nWidth, unsigned int nHeig
     return nStrip;
 }
 
+struct TableField
+{
+    double value;
+    Colour colour;
+};
+
+// The entries whose colours the picture has: tables often have many more.
+std::vector<TableField> ListShown(const krv::gobs::PCT& oTable, const Picture& oPicture)
+{
+    std::set<std::array<std::uint8_t, 3>> oSeen;
+    for (std::size_t i = 0; i + 3 <= oPicture.pixels.size() && oPicture.samples >= 3; i += oPicture.samples)
+        if (!HasAlpha(oPicture) || oPicture.pixels[i + 3] != 0)
+            oSeen.insert({oPicture.pixels[i], oPicture.pixels[i + 1], oPicture.pixels[i + 2]});
+    std::vector<TableField> oFields;
+    for (const auto& oEntry : oTable.GetEntries())
+    {
+        const auto oColour = oTable.GetValue(oEntry.low);
+        if (oFields.size() < MOST_FIELDS && oSeen.contains({oColour.red, oColour.green, oColour.blue}))
+            oFields.push_back({oEntry.low, {oColour.red, oColour.green, oColour.blue}});
+    }
+    return oFields;
+}
+
 } // namespace
 
 void AddGreyLegend(double nBlack, double nWhite, bool bInverted, Picture& oPicture)
 {
-    const std::string left = fmt::format("{:.6g}", nBlack), right = fmt::format("{:.6g}", nWhite);
+    const std::string left = fmt::format("{:.4g}", nBlack), right = fmt::format("{:.4g}", nWhite);
     const unsigned int nTexts = WidthOf(left) + WidthOf(right) + 3 * GAP;
     const unsigned int nTop = MakeRoom(oPicture, std::max(nTexts, LEAST_WIDTH), FIELD + LETTER_HEIGHT + 3 * GAP);
     const unsigned int nLength = oPicture.width - 2 * GAP;
@@ -122,13 +147,13 @@ void AddGreyLegend(double nBlack, double nWhite, bool bInverted, Picture& oPictu
 
 void AddColourLegend(const krv::gobs::PCT& oTable, Picture& oPicture)
 {
-    const auto& oEntries = oTable.GetEntries();
-    const auto nShown = static_cast<unsigned int>(std::min<std::size_t>(oEntries.size(), MOST_FIELDS));
+    const auto oEntries = ListShown(oTable, oPicture);
+    const auto nShown = static_cast<unsigned int>(oEntries.size());
     std::vector<std::string> oTexts;
     unsigned int nText = 0;
     for (unsigned int i = 0; i < nShown; ++i)
     {
-        oTexts.push_back(fmt::format("{:.6g}", oEntries[i].low));
+        oTexts.push_back(fmt::format("{:.6g}", oEntries[i].value));
         nText = std::max(nText, WidthOf(oTexts.back()));
     }
     const unsigned int nStep = FIELD + nText + 2 * GAP;
@@ -138,10 +163,8 @@ void AddColourLegend(const krv::gobs::PCT& oTable, Picture& oPicture)
     for (unsigned int i = 0; i < nShown; ++i)
     {
         const unsigned int nX = GAP + i % nAcross * nStep, nY = nTop + GAP + i / nAcross * (FIELD + GAP);
-        unsigned char nAlpha = 0;
-        const auto oColour = oTable.GetValue(oEntries[i].low, nAlpha);
         PaintField(oPicture, nX, nY, FIELD, FIELD, INK);
-        PaintField(oPicture, nX + 1, nY + 1, FIELD - 2, FIELD - 2, {oColour.red, oColour.green, oColour.blue});
+        PaintField(oPicture, nX + 1, nY + 1, FIELD - 2, FIELD - 2, oEntries[i].colour);
         Write(oPicture, nX + FIELD + 2, nY + 2, oTexts[i]);
     }
 }

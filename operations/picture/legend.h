@@ -12,7 +12,7 @@ namespace krv::operations
 // A wedge from the value of black to that of white with both numbers; bInverted: from that of white to that of black.
 void AddGreyLegend(double nBlack, double nWhite, bool bInverted, Picture& oPicture);
 
-// The entries of a table as fields of their colour with their values, as many as fit into a few rows.
+// The entries of a table whose colours the picture has, the first 64, as fields with their values.
 void AddColourLegend(const krv::gobs::PCT& oTable, Picture& oPicture);
 
 } // namespace krv::operations

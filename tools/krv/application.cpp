@@ -2,6 +2,7 @@
 
 #include "toolkit/nspio/warning.h"
 #include "tools/krv/errors.h"
+#include "tools/krv/helpformatter.h"
 #include "tools/krv/interrupt.h"
 #include "tools/krv/nearestword.h"
 #include "tools/krv/threads.h"
@@ -11,6 +12,7 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <memory>
 #include <mutex>
 #include <string>
 #include <vector>
@@ -173,10 +175,12 @@ int RunVerb(const Selection& oSelection, bool bVerbose)
 int RunApplication(int nArguments, char** pArguments)
 {
     CLI::App oApp("Reads and writes raster files of every format that has a plug-in.", "krv");
+    oApp.formatter(std::make_shared<HelpFormatter>());
+    oApp.set_help_flag("-h,--help", "Say this");
     Selection oSelection;
     bool bVerbose = false;
     unsigned int nThreads = 0;
-    oApp.set_version_flag("--version", "krv " KRV_VERSION);
+    oApp.set_version_flag("--version", "krv " KRV_VERSION, "Say which version this is");
     oApp.add_flag("--verbose", bVerbose, "Errors also name the function, source file and line");
     oApp.add_option("--threads", nThreads, "How many threads work at one time; one for each processor by default")
         ->check(CLI::Range(1U, MOST_THREADS));

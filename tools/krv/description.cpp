@@ -1,6 +1,7 @@
 #include "tools/krv/description.h"
 
 #include "tools/krv/errors.h"
+#include "tools/krv/helpformatter.h"
 
 #include <CLI/CLI.hpp>
 #include <fmt/format.h>
@@ -67,23 +68,9 @@ std::vector<std::string> NamesOf(const CLI::Option& oOption)
     return oNames;
 }
 
-// The words that an option takes, from "{a|b}"; none for one that takes anything.
-std::vector<std::string> WordsOf(const CLI::Option& oOption)
-{
-    const std::string type = oOption.get_type_name();
-    const std::size_t nBegin = type.find('{'), nEnd = type.find('}');
-    std::vector<std::string> oWords;
-    if (nBegin == std::string::npos || nEnd == std::string::npos || nEnd < nBegin)
-        return oWords;
-    std::istringstream oList(type.substr(nBegin + 1, nEnd - nBegin - 1));
-    for (std::string word; std::getline(oList, word, '|');)
-        oWords.push_back(word);
-    return oWords;
-}
-
 std::string OptionText(const CLI::Option& oOption)
 {
-    const std::vector<std::string> oWords = WordsOf(oOption);
+    const std::vector<std::string> oWords = GetWordsOf(oOption);
     std::string text = ".TP\n\\fB" + Roff(fmt::format("{}", fmt::join(NamesOf(oOption), ", "))) + "\\fR";
     if (TakesValue(oOption))
         text +=
@@ -164,7 +151,7 @@ std::string BashValues(const CLI::App& oApp, const CLI::App& oVerb)
     for (const CLI::Option* const poOption : ListNamed(oApp, &oVerb))
         if (TakesValue(*poOption))
         {
-            const std::vector<std::string> oWords = WordsOf(*poOption);
+            const std::vector<std::string> oWords = GetWordsOf(*poOption);
             cases += fmt::format("            {}) {} ;;\n", fmt::join(NamesOf(*poOption), "|"),
                                  oWords.empty() ? "return"
                                                 : fmt::format("COMPREPLY=($(compgen -W \"{}\" -- \"$word\")); return",
@@ -223,7 +210,7 @@ std::string ZshOptions(const CLI::App& oApp, const CLI::App* poVerb)
     std::string text;
     for (const CLI::Option* const poOption : ListNamed(oApp, poVerb))
     {
-        const std::vector<std::string> oWords = WordsOf(*poOption);
+        const std::vector<std::string> oWords = GetWordsOf(*poOption);
         for (const std::string& name : NamesOf(*poOption))
             text += fmt::format(" \\\n                '{}{}[{}]{}'", poOption->get_items_expected_max() > 1 ? "*" : "",
                                 name, ZshText(poOption->get_description()),

@@ -9,6 +9,7 @@
 #include "datasources/interfaces/ifileiobuilder.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
+#include "datasources/interfaces/ilayoutdataset.h"
 #include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/inewfiledataset.h"
@@ -16,6 +17,7 @@
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/iplaceremoval.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/interfaces/istoragedataset.h"
@@ -118,6 +120,8 @@ std::vector<Table> Tables()
           Slot(&PC::CreatePCT), Slot(&PC::UpdatePCT), Slot(&PC::SetPCTDescription), Slot(&PC::DeletePCT)}},
         {"INewFileDataset", {Slot(&INewFileDataset::KeepExisting)}},
         {"IStorageDataset", {Slot(&IStorageDataset::GetUnusedBytes)}},
+        {"ILayoutDataset", {Slot(&ILayoutDataset::GetVariant), Slot(&ILayoutDataset::CheckCloudLayout)}},
+        {"IPlaceRemoval", {Slot(&IPlaceRemoval::RemoveCRS), Slot(&IPlaceRemoval::RemoveGeocoding)}},
         {"IPagedDataset", {Slot(&IPagedDataset::CountFurtherImages)}},
         {"IEncodedBlocks",
          {Slot(&IEncodedBlocks::GetEncodedForm), Slot(&IEncodedBlocks::ReadEncoded),

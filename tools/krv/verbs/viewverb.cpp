@@ -65,7 +65,7 @@ std::string Describe(const SourceFile& oFile, const QuickLook& oLook)
         const Stretch& oStretch = oLook.stretches[c];
         const bool bStored = oLook.power || oLook.decibels || oChoice.channels.size() <= c;
         const ValueScale oScale = bStored ? ValueScale() : oFile.GetScale(oChoice.channels[c]);
-        text += fmt::format(" {:g}..{:g}", oScale(oStretch.low), oScale(oStretch.high));
+        text += fmt::format(" {:.4g}..{:.4g}", oScale(oStretch.low), oScale(oStretch.high));
     }
     return text + (oLook.decibels ? " dB" : "");
 }
