@@ -2,7 +2,6 @@
 
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/reader/derived/derivedreader.h"
-#include "datasources/reader/ivalidityreader.h"
 #include "datasources/reader/validitysource.h"
 #include "gobs/raster/datatype.h"
 #include "operations/copy/conversion.h"
@@ -18,7 +17,7 @@ namespace krv::operations::detail
 // The values of a file by a straight line for each channel, in a type of its own. A value that is not valid becomes
 // NaN, or of integers the type's least value, which no valid value becomes then; the record says so. The file outlives
 // the reader.
-class ScaledReader : public krv::datasources::DerivedReader, public krv::datasources::IValidityReader
+class ScaledReader : public krv::datasources::DerivedReader
 {
 public:
     // By the request's scale, or by what the file records; as 32R unless the request has a type. Throws
