@@ -13,6 +13,7 @@
 #include "datasources/interfaces/iformatoptions.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
+#include "datasources/interfaces/ilayoutdataset.h"
 #include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/ilutdataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
@@ -21,6 +22,7 @@
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/iplaceremoval.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/interfaces/isidecardataset.h"
@@ -46,6 +48,7 @@ IFileIOBuilder::~IFileIOBuilder() = default;
 IFormatOptions::~IFormatOptions() = default;
 IGeocodedDataset::~IGeocodedDataset() = default;
 IHistoryIO::~IHistoryIO() = default;
+ILayoutDataset::~ILayoutDataset() = default;
 ILinkedDataset::~ILinkedDataset() = default;
 ILUTDataset::~ILUTDataset() = default;
 IMathModelDataset::~IMathModelDataset() = default;
@@ -54,6 +57,7 @@ IOverviewIO::~IOverviewIO() = default;
 IOverviewManager::~IOverviewManager() = default;
 IPCTDataset::~IPCTDataset() = default;
 IPagedDataset::~IPagedDataset() = default;
+IPlaceRemoval::~IPlaceRemoval() = default;
 IRasterDataset::~IRasterDataset() = default;
 IRasterIO::~IRasterIO() = default;
 ISidecarDataset::~ISidecarDataset() = default;

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "datasources/api.h"
+#include "gobs/mask/samplevalue.h"
 #include "gobs/resampling/resampling.h"
 
 #include <cstdint>
@@ -51,6 +52,8 @@ struct OverviewOptions
     bool mbPower = false;
     // NaN samples of real channels are not valid; without it they count like any value.
     bool mbNaNIsNoData = false;
+    // The no-data value of all channels, in place of what the dataset records.
+    std::optional<krv::gobs::SampleValue> moNoData;
     // Only this part of the image changed: of levels that exist just the pixels that depend on it are written. Levels
     // that do not exist are built whole.
     std::optional<Rectangle> moChanged;

@@ -100,29 +100,45 @@ unsigned int FindAlpha(const AuxiliaryData& oMetadata)
 ValiditySource::ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels, BkgdRule eRule,
                                bool bNoData)
 {
-    const Place oPlace = Place::Current();
+    FindSize(poDataset);
+    FindAll(*poDataset, poDataset->ReadAuxiliaryData(), oChannels, eRule, bNoData);
+}
+
+ValiditySource::ValiditySource(IDataset* poDataset, const AuxiliaryData& oRecord,
+                               const std::vector<unsigned int>& oChannels, BkgdRule eRule, bool bNoData)
+{
+    FindSize(poDataset);
+    FindAll(*poDataset, oRecord, oChannels, eRule, bNoData);
+}
+
+void ValiditySource::FindSize(IDataset* poDataset, const Place& oPlace)
+{
     if (poDataset == nullptr)
         throw krv::DataException("The dataset is NULL", oPlace);
     const auto& oRasterDataset =
         detail::RequireFacet<IRasterDataset>(poDataset, "This dataset doesn't support Raster.", oPlace);
     mnImageWidth = oRasterDataset.GetWidth();
     mnImageHeight = oRasterDataset.GetHeight();
-    const AuxiliaryData oMetadata = poDataset->ReadAuxiliaryData();
+}
+
+void ValiditySource::FindAll(IDataset& oDataset, const AuxiliaryData& oRecord,
+                             const std::vector<unsigned int>& oChannels, BkgdRule eRule, bool bNoData)
+{
     const std::vector<unsigned int> oListed =
-        oChannels.empty() ? detail::FirstChannels(oMetadata.GetChannelCount()) : oChannels;
-    const unsigned int nAlpha = FindAlpha(oMetadata);
-    FindNoData(oMetadata, bNoData ? oListed : std::vector<unsigned int>(), nAlpha, eRule);
+        oChannels.empty() ? detail::FirstChannels(oRecord.GetChannelCount()) : oChannels;
+    const unsigned int nAlpha = FindAlpha(oRecord);
+    FindNoData(oRecord, bNoData ? oListed : std::vector<unsigned int>(), nAlpha, eRule);
     meRule = eRule;
-    FindBitmap(*poDataset, oListed);
+    FindBitmap(oDataset, oListed);
     const auto oAlpha = std::find(oListed.begin(), oListed.end(), nAlpha);
     if (nAlpha != 0 && oAlpha != oListed.end())
         UseAlphaOfRaster(static_cast<unsigned int>(oAlpha - oListed.begin()) + 1);
     else if (nAlpha != 0)
         mpoAlpha = std::make_unique<BitmapBackground>(
-            std::make_unique<BasicReader>(poDataset, std::vector<unsigned int>{nAlpha}, false));
+            std::make_unique<BasicReader>(&oDataset, std::vector<unsigned int>{nAlpha}, false));
     for (std::size_t n = 0; n < moChannels.size(); ++n)
     {
-        const auto oValue = bNoData ? GetTypedNoData(oMetadata, oListed[n]) : std::nullopt;
+        const auto oValue = bNoData ? GetTypedNoData(oRecord, oListed[n]) : std::nullopt;
         if (!oValue || oListed[n] == nAlpha)
             continue;
         const ExactMaskDecision oDecision(krv::gobs::eAnyChannel, {*oValue}, {static_cast<unsigned int>(n) + 1});

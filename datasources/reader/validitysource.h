@@ -4,6 +4,7 @@
 #include "gobs/mask/imaskbuilder.h"
 #include "gobs/mask/maskdecision.h"
 #include "gobs/raster/margins.h"
+#include "toolkit/exceptions/place.h"
 
 #include <cstddef>
 #include <memory>
@@ -45,6 +46,9 @@ public:
     // bNoData: without it mask bitmap and alpha alone.
     explicit ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels = {},
                             krv::gobs::BkgdRule eRule = krv::gobs::eAllChannels, bool bNoData = true);
+    // The same by another record than the dataset's own.
+    ValiditySource(IDataset* poDataset, const AuxiliaryData& oRecord, const std::vector<unsigned int>& oChannels,
+                   krv::gobs::BkgdRule eRule = krv::gobs::eAllChannels, bool bNoData = true);
     // For rasters of a level of that size, or of the image itself, with everything that the dataset says: a pixel of a
     // level is valid by mask bitmap or alpha where any pixel of its box is, by the mask's own level where the dataset
     // holds one of that size. Throws the same.
@@ -76,6 +80,9 @@ public:
     krv::gobs::Mask* BuildMask(const krv::gobs::Raster& oRaster) const override;
 
 private:
+    void FindSize(IDataset* poDataset, const Place& oPlace = Place::Current());
+    void FindAll(IDataset& oDataset, const AuxiliaryData& oRecord, const std::vector<unsigned int>& oChannels,
+                 krv::gobs::BkgdRule eRule, bool bNoData);
     void FindNoData(const AuxiliaryData& oMetadata, const std::vector<unsigned int>& oChannels, unsigned int nAlpha,
                     krv::gobs::BkgdRule eRule);
     void FindBitmap(IDataset& oDataset, const std::vector<unsigned int>& oChannels);

@@ -15,8 +15,10 @@
 #include "operations/copy/detail/copymodels.h"
 #include "operations/copy/detail/copypixels.h"
 #include "operations/copy/detail/copyrecord.h"
+#include "operations/copy/detail/copystatistics.h"
 #include "operations/copy/detail/copyvalidity.h"
 #include "operations/copy/detail/keptform.h"
+#include "operations/copy/detail/scaledreader.h"
 #include "operations/copy/detail/storereader.h"
 #include "operations/copy/detail/target.h"
 #include "operations/job/exceptions.h"
@@ -29,6 +31,7 @@
 #include <algorithm>
 #include <filesystem>
 #include <memory>
+#include <numeric>
 #include <optional>
 #include <system_error>
 
@@ -244,28 +247,50 @@ bool HasLevels(const SourceFile& oSource)
     return poLevels != nullptr && !poLevels->GetLevels().empty();
 }
 
+// A copy of what a reader makes of one file.
+void ConvertByReader(const StoredChannels::Open& oOpen, const SourceFile& oSource, const CopyRequest& oRequest,
+                     const TargetForm& oForm, const Progress& oProgress, krv::threading::IExecutor* poExecutor)
+{
+    const std::shared_ptr<const IRasterReader> poReader = oOpen(oSource);
+    const PixelWindow oWindow =
+        FindWindow(oSource, oRequest.window).value_or(PixelWindow{0, 0, poReader->GetWidth(), poReader->GetHeight()});
+    if (oWindow.width == 0 || oWindow.height == 0 || std::uint64_t{oWindow.x} + oWindow.width > poReader->GetWidth() ||
+        std::uint64_t{oWindow.y} + oWindow.height > poReader->GetHeight())
+        throw RequestException(fmt::format("{}: the window is not inside the image of {} x {} pixels",
+                                           oSource.GetName(), poReader->GetWidth(), poReader->GetHeight()));
+    const std::vector<krv::gobs::DataType> oTypes(poReader->GetChansCount(), poReader->GetDataType());
+    std::vector<unsigned int> oChannels(oTypes.size());
+    std::iota(oChannels.begin(), oChannels.end(), 1U);
+    const Target oTarget(TargetLayout{oWindow.width, oWindow.height, oTypes}, oForm, oProgress, poExecutor);
+    StoreReaders(oSource, {{oOpen, oChannels}}, oWindow, oTarget, "convert");
+}
+
 void ConvertPower(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress,
                   krv::threading::IExecutor* poExecutor)
 {
-    if (oRequest.sources.size() != 1 || oRequest.type || oRequest.promote)
-        throw RequestException("the power is that of one file, and has a type of its own");
+    if (oRequest.sources.size() != 1 || oRequest.type || oRequest.promote || oRequest.noData)
+        throw RequestException("the power is that of one file, and has a type and a no-data value of its own");
     const SourceFile oSource(oRequest.sources.front());
     PowerRequest oPower;
     oPower.moChannels = oRequest.channels.empty() ? oRequest.channels : oSource.CheckChannels(oRequest.channels);
-    TotalPowerRasterReader oReader(&oSource.GetDataset(), false, oPower);
-    const PixelWindow oWindow =
-        FindWindow(oSource, oRequest.window).value_or(PixelWindow{0, 0, oReader.GetWidth(), oReader.GetHeight()});
-    if (oWindow.width == 0 || oWindow.height == 0 || std::uint64_t{oWindow.x} + oWindow.width > oReader.GetWidth() ||
-        std::uint64_t{oWindow.y} + oWindow.height > oReader.GetHeight())
-        throw RequestException(fmt::format("{}: the window is not inside the image of {} x {} pixels",
-                                           oSource.GetName(), oReader.GetWidth(), oReader.GetHeight()));
-    const Target oTarget(TargetLayout{oWindow.width, oWindow.height, {oReader.GetDataType()}}, oForm, oProgress,
-                         poExecutor);
     const auto Open = [&oPower](const SourceFile& oFile)
     {
         return std::make_shared<TotalPowerRasterReader>(&oFile.GetDataset(), false, oPower);
     };
-    StoreReaders(oSource, {{Open, {1}}}, oWindow, oTarget, "convert");
+    ConvertByReader(Open, oSource, oRequest, oForm, oProgress, poExecutor);
+}
+
+void ConvertScaled(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress,
+                   krv::threading::IExecutor* poExecutor)
+{
+    if (oRequest.sources.size() != 1 || oRequest.promote || oRequest.power)
+        throw RequestException("values are scaled of one file, into one type");
+    const SourceFile oSource(oRequest.sources.front(), eReadOnly, oRequest.noData);
+    const auto Open = [&oRequest](const SourceFile& oFile)
+    {
+        return std::make_shared<ScaledReader>(oFile, oRequest);
+    };
+    ConvertByReader(Open, oSource, oRequest, oForm, oProgress, poExecutor);
 }
 
 } // namespace
@@ -274,6 +299,8 @@ void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progres
              krv::threading::IExecutor* poExecutor)
 {
     CheckTarget(oRequest.sources, oForm.name);
+    if (oRequest.unscale || !oRequest.scale.empty())
+        return ConvertScaled(oRequest, oForm, oProgress, poExecutor);
     if (oRequest.power)
         return ConvertPower(oRequest, oForm, oProgress, poExecutor);
     const CopyPlan oPlan(oRequest);
@@ -304,14 +331,18 @@ void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progres
     // LAYOUT=COG means the same to every format: a file laid out for reading over a network has its levels.
     const auto oOptions = ParseOptions(oForm.options);
     const auto oLayout = oOptions.find("LAYOUT");
-    const bool bWanted = oLayout != oOptions.end() && oLayout->second == "COG" && !HasLevels(oPlan.GetSource(0));
+    const bool bCloud = oLayout != oOptions.end() && oLayout->second == "COG";
+    const bool bWanted = bCloud && !HasLevels(oPlan.GetSource(0));
     // Levels that are encoded with loss beside blocks that moved: a mask tells of theirs which pixels are valid.
     auto* const poBitmaps = oTarget.Find<IBitmapDataset>();
     if (bWanted && oTarget.IsLossy() && poBitmaps != nullptr && FindValidityMask(*poBitmaps) == 0 &&
         HasValidityInValues(oPlan))
         WriteValidity(oPlan, oTarget, 0);
-    CopyLevels(oPlan, oTarget, oBitmaps, oPlan.IsWholeFile() && !oPlan.IsCut() && oPlan.AreTypesKept() && !bMask,
-               bWanted);
+    // Levels that were made by another no-data value are none of this copy.
+    CopyLevels(oPlan, oTarget, oBitmaps,
+               oPlan.IsWholeFile() && !oPlan.IsCut() && oPlan.AreTypesKept() && !bMask && !oRequest.noData, bWanted);
+    if (bCloud)
+        AddStatistics(oPlan, oTarget, oRecord);
     oTarget.Get().Close();
 }
 

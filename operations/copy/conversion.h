@@ -25,7 +25,13 @@ struct CopyRequest
     WindowRequest window;                    // nothing: the whole image
     std::optional<krv::gobs::DataType> type; // of all channels; nothing: each keeps its own
     bool promote = false;                    // the smallest type that holds all, in place of `type`
-    bool power = false;                      // the power of a radar scene, one channel, in place of its channels
+    std::optional<std::string> noData = {};  // of all files, in place of what they record; the copy records it
+    // What values stand for (SourceFile::GetScale), as 32R unless a type is given. Of one file.
+    bool unscale = false;
+    // Two numbers whose values become the least and the largest of the type, 0 and 1 for reals; two more to become
+    // these. Values beyond are cut off. The copy records how to come back. Of one file; empty: none of it.
+    std::vector<double> scale = {};
+    bool power = false; // the power of a radar scene, one channel, in place of its channels
 };
 
 // How the copy is stored.

@@ -6,6 +6,7 @@
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/ifileformat.h"
+#include "datasources/interfaces/ilayoutdataset.h"
 #include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/ioverviewmanager.h"
@@ -420,6 +421,24 @@ std::vector<Finding> CheckFile(const std::string& file, const std::vector<Loaded
     else if (!bRecognised)
         oFindings.push_back({false, "file " + file, "no format recognises it",
                              "install the plug-in of its format, or convert it to one that `krv formats` lists"});
+    return oFindings;
+}
+
+std::vector<Finding> CheckCloudLayout(const std::string& file)
+{
+    constexpr char REMEDY[] = "krv convert IN OUT.tif --options \"LAYOUT=COG COMPRESS=DEFLATE\" makes a copy that is";
+    const SourceFile oFile(file);
+    auto* const poLayout = dynamic_cast<ILayoutDataset*>(&oFile.GetDataset());
+    const auto oReasons = poLayout != nullptr ? poLayout->CheckCloudLayout() : std::nullopt;
+    const std::string subject = "layout of " + file;
+    if (!oReasons)
+        return {{false, subject, "files of this format are not laid out for reading over a network", REMEDY}};
+    if (oReasons->empty())
+        return {{true, subject, "it is laid out for reading over a network (COG)", {}}};
+    std::vector<Finding> oFindings;
+    for (const std::string& reason : *oReasons)
+        oFindings.push_back({false, subject, reason, {}});
+    oFindings.back().remedy = REMEDY;
     return oFindings;
 }
 

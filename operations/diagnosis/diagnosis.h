@@ -62,4 +62,8 @@ KRV_OPERATIONS_API std::string DescribeUnknown(const std::string& file);
 // Why a file opens or does not: the file itself, which plug-ins were asked, what each said, and what its opening gave.
 KRV_OPERATIONS_API std::vector<Finding> CheckFile(const std::string& file, const std::vector<LoadedPlugin>& oPlugins);
 
+// Whether a file is laid out so that programs read it in few requests over a network, and if not, why: a finding for
+// each reason. Passes what opening the file throws.
+KRV_OPERATIONS_API std::vector<Finding> CheckCloudLayout(const std::string& file);
+
 } // namespace krv::operations

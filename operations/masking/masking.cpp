@@ -16,11 +16,12 @@
 #include "operations/job/progress.h"
 #include "operations/masking/detail/polygonplacer.h"
 #include "operations/masking/polygontext.h"
-#include "operations/picture/pngwriter.h"
+#include "operations/picture/picturewriter.h"
 #include "operations/source/fileworkers.h"
 #include "operations/source/sourcefile.h"
 #include "toolkit/core/gglshape.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/warning.h"
 #include "toolkit/threading/foreachitem.h"
 
 #include <fmt/format.h>
@@ -45,6 +46,21 @@ using krv::gobs::RasterInfo;
 using MaskPointer = std::unique_ptr<Mask>;
 using TileMasker = std::function<MaskPointer(const RasterInfo&, const RasterContext&)>;
 
+// Whether the rectangle around a shape meets that of the image.
+bool Touches(const GGLShape& oShape, const krv::datasources::IRasterDataset& oImage)
+{
+    double nLeft = HUGE_VAL, nTop = HUGE_VAL, nRight = -HUGE_VAL, nBottom = -HUGE_VAL;
+    for (const GDBVertex& oVertex : oShape.GetVertices())
+    {
+        nLeft = std::min(nLeft, oVertex.x);
+        nRight = std::max(nRight, oVertex.x);
+        nTop = std::min(nTop, oVertex.y);
+        nBottom = std::max(nBottom, oVertex.y);
+    }
+    return nRight > 0 && nBottom > 0 && nLeft < oImage.GetWidth() && nTop < oImage.GetHeight();
+}
+
+// Nothing when all polygons lie outside of the image.
 TileMasker MaskPolygons(const SourceFile& oFile, const MaskRequest& oRequest)
 {
     const auto nRows = static_cast<int>(oFile.GetRaster().GetHeight());
@@ -55,16 +71,18 @@ TileMasker MaskPolygons(const SourceFile& oFile, const MaskRequest& oRequest)
         for (const auto& oRings : oText.polygons)
             for (const GGLShape& oShape : oPlacer.Place(oRings))
             {
+                if (!Touches(oShape, oFile.GetRaster()))
+                    continue;
                 if (poBuilder == nullptr)
                     poBuilder = std::make_shared<krv::datasources::PolygonMaskBuilder>(oShape, 0, nRows);
                 else
                     poBuilder->AddPolygon(oShape, 0, nRows);
             }
     }
+    if (poBuilder == nullptr)
+        return {};
     return [poBuilder](const RasterInfo& oInfo, const RasterContext& oContext)
     {
-        if (poBuilder == nullptr) // all polygons lie elsewhere
-            return std::make_unique<Mask>(oInfo, oContext);
         return MaskPointer(poBuilder->BuildMask(Raster(oInfo, oContext)));
     };
 }
@@ -278,9 +296,8 @@ struct Worker
 };
 
 // Polygons are placed once; what makes their masks is not changed by it.
-FileWorkers<Worker>::MakeWorker MakeMaskers(const SourceFile& oFile, const MaskRequest& oRequest)
+FileWorkers<Worker>::MakeWorker MakeMaskers(const MaskRequest& oRequest, const TileMasker& oPolygons)
 {
-    const TileMasker oPolygons = oRequest.polygons.empty() ? TileMasker() : MaskPolygons(oFile, oRequest);
     return [&oRequest, oPolygons](FilePointer poFile)
     {
         TileMasker oMasker = oPolygons         ? oPolygons
@@ -309,7 +326,13 @@ MaskResult MakeMask(const SourceFile& oFile, const MaskRequest& oRequest, const 
     if (oRequest.IsWriting() && poRead == nullptr)
         poExecutor = nullptr;
     const SourceFile& oSource = poRead != nullptr ? *poRead : oFile;
-    FileWorkers<Worker> oWorkers(oSource, MakeMaskers(oSource, oRequest));
+    const TileMasker oPolygons = oRequest.polygons.empty() ? TileMasker() : MaskPolygons(oSource, oRequest);
+    if (!oRequest.polygons.empty() && !oPolygons)
+    {
+        krv::nspio::Warning::Warn(oFile.GetName() + ": no polygon touches the image; nothing is written");
+        return {0, std::uint64_t{nWidth} * nHeight};
+    }
+    FileWorkers<Worker> oWorkers(oSource, MakeMaskers(oRequest, oPolygons));
     std::optional<MaskPicture> oPicture;
     if (!oRequest.picture.empty())
         oPicture.emplace(nWidth, nHeight, oRequest.pictureSize);

@@ -70,8 +70,9 @@ struct MaskResult
 
 // Makes the mask tile by tile. Bits set are inside a polygon, set in a bitmap, or no-data; a picture shows them white.
 // A bitmap of the file gets them as they are, but the validity mask the complement of no-data: there set bits are valid
-// pixels. oFile: opened for update when the request is writing. When something fails it stays as it was. Throws
-// RequestException for a second validity mask.
+// pixels. Polygons that all lie outside of the image are a warning, and nothing is written. oFile: opened for update
+// when the request is writing. When something fails it stays as it was. Throws RequestException for a second validity
+// mask.
 KRV_OPERATIONS_API MaskResult MakeMask(const SourceFile& oFile, const MaskRequest& oRequest,
                                        const Progress& oProgress = {}, krv::threading::IExecutor* poExecutor = nullptr);
 

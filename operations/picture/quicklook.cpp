@@ -5,9 +5,11 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/derived/pctrasterreader.h"
+#include "datasources/reader/derived/totalpowerrasterreader.h"
 #include "gobs/pct/pct.h"
 #include "operations/job/exceptions.h"
 #include "operations/job/progress.h"
+#include "operations/picture/legend.h"
 #include "operations/source/sourcefile.h"
 #include "toolkit/exceptions/exceptions.h"
 
@@ -237,6 +239,65 @@ void DropOpaqueAlpha(Picture& oPicture)
     --oPicture.samples;
 }
 
+// The total power of the file's channels, in the mean of each pixel.
+std::vector<Plane> ReadPower(const SourceFile& oFile, const std::vector<unsigned int>& oChannels, const Size& oSize,
+                             const Threads& oThreads)
+{
+    const auto Read = [&](const SourceFile& oSource)
+    {
+        krv::datasources::PowerRequest oRequest;
+        oRequest.moChannels = oChannels;
+        return LevelReader::AtLeast(
+            std::make_unique<krv::datasources::TotalPowerRasterReader>(&oSource.GetDataset(), false, oRequest),
+            oSize.width, oSize.height, oSource.GetName());
+    };
+    ProgressCounter oCounter(oThreads.progress, "view", ReaderBytes(Read(oFile).Get()));
+    return Reduce(oFile, Read, {std::nullopt}, oSize.width, oSize.height, Resampling::eAverage, oCounter,
+                  oThreads.executor);
+}
+
+// What is not above 0 has no logarithm, and is no more seen than other missing pixels.
+void TakeDecibels(std::vector<Plane>& oPlanes)
+{
+    for (Plane& oPlane : oPlanes)
+        for (std::size_t i = 0; i < oPlane.values.size(); ++i)
+        {
+            const bool bShown = oPlane.coverage[i] > 0 && oPlane.values[i] > 0;
+            oPlane.coverage[i] = bShown ? oPlane.coverage[i] : 0.0F;
+            oPlane.values[i] = bShown ? 10.0F * std::log10(oPlane.values[i]) : 0.0F;
+        }
+}
+
+// Pixels of a collar take no part in the stretch, though they are shown.
+std::vector<Plane> WithoutCollar(const std::vector<Plane>& oPlanes)
+{
+    std::vector<Plane> oResult = oPlanes;
+    const std::vector<bool> oCollar = FindCollar(oPlanes);
+    for (Plane& oPlane : oResult)
+        for (std::size_t i = 0; i < oCollar.size(); ++i)
+            oPlane.coverage[i] = oCollar[i] ? 0.0F : oPlane.coverage[i];
+    return oResult;
+}
+
+bool ShowsPower(const SourceFile& oFile, const QuickLookOptions& oOptions, const DisplayChoice& oChoice)
+{
+    return oOptions.power || (oOptions.channels.empty() && oOptions.stretch == StretchMode::eAuto &&
+                              oFile.GetType(oChoice.channels.front()).IsComplex());
+}
+
+void AddLegend(const SourceFile& oFile, QuickLook& oLook)
+{
+    const DisplayChoice& oChoice = oLook.choice;
+    if (oChoice.table != nullptr)
+        return AddColourLegend(*oChoice.table, oLook.picture);
+    if (oLook.stretches.size() != 1)
+        throw RequestException("a legend is of one channel; name it");
+    const ValueScale oScale = oLook.decibels || oLook.power ? ValueScale() : oFile.GetScale(oChoice.channels.front());
+    const Stretch& oStretch = oLook.stretches.front();
+    const double nLow = oScale(oStretch.low), nHigh = oScale(oStretch.high);
+    AddGreyLegend(nLow, nHigh, oChoice.inverted, oLook.picture);
+}
+
 } // namespace
 
 QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOptions, const Progress& oProgress,
@@ -254,10 +315,17 @@ QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOption
         oLook.picture.pixels.resize(std::size_t{oSize.width} * oSize.height * 4);
         PaintColours(oLook.picture, ReadColours(oFile, oChoice, oSize, oThreads));
         DropOpaqueAlpha(oLook.picture);
+        if (oOptions.legend)
+            AddLegend(oFile, oLook);
         return oLook;
     }
+    oLook.power = ShowsPower(oFile, oOptions, oChoice);
+    oLook.decibels = oOptions.decibels || (oLook.power && oOptions.stretch == StretchMode::eAuto);
     const Resampling eMethod = oOptions.average ? Resampling::eAverage : Resampling::eNearest;
-    std::vector<Plane> oPlanes = ReadPlanes(oFile, oChoice.channels, oSize, eMethod, oThreads);
+    std::vector<Plane> oPlanes = oLook.power ? ReadPower(oFile, oOptions.channels, oSize, oThreads)
+                                             : ReadPlanes(oFile, oChoice.channels, oSize, eMethod, oThreads);
+    if (oLook.decibels)
+        TakeDecibels(oPlanes);
     const std::vector<float> oOpacity = FindOpacity(oFile, oChoice, oSize, oPlanes, oThreads);
 
     const bool bInks = oPlanes.size() == 4;
@@ -266,12 +334,16 @@ QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOption
 
     oLook.picture.samples = oPlanes.size() == 3 ? 4U : 2U;
     oLook.picture.pixels.resize(std::size_t{oSize.width} * oSize.height * oLook.picture.samples);
+    const std::vector<Plane> oCounted = WithoutCollar(oPlanes);
     for (std::size_t c = 0; c < oPlanes.size(); ++c)
-        oLook.stretches.push_back(FindStretch(oPlanes[c], bInks ? StretchMode::eNone : oOptions.stretch,
-                                              oFile.GetType(oChoice.channels[c]) == krv::gobs::eDT_8U));
+        oLook.stretches.push_back(FindStretch(oCounted[c], bInks ? StretchMode::eNone : oOptions.stretch,
+                                              !oLook.power && oFile.GetType(oChoice.channels[c]) == krv::gobs::eDT_8U,
+                                              oChoice.reason == DisplayReason::eRoles));
     PaintStretched(oLook.picture, oPlanes, oLook.stretches, oChoice.inverted);
     PaintOpacity(oLook.picture, oOpacity);
     DropOpaqueAlpha(oLook.picture);
+    if (oOptions.legend)
+        AddLegend(oFile, oLook);
     return oLook;
 }
 

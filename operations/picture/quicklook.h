@@ -2,7 +2,7 @@
 
 #include "operations/job/progress.h"
 #include "operations/picture/displaychoice.h"
-#include "operations/picture/pngwriter.h"
+#include "operations/picture/picturewriter.h"
 #include "operations/picture/stretch.h"
 
 #include <vector>
@@ -21,6 +21,11 @@ struct QuickLookOptions
     std::vector<unsigned int> channels; // one, or red, green and blue; empty: the file's defaults
     StretchMode stretch = StretchMode::eAuto;
     bool average = true; // nearest otherwise
+    bool power = false;  // the power of a radar scene in place of its channels
+    // Values as 10 times their logarithm, as the power of radar scenes is looked at. Complex channels are shown so, by
+    // their power, unless channels or a stretch are asked for.
+    bool decibels = false;
+    bool legend = false; // what the levels or colours stand for, below the picture; not for three channels
 };
 
 struct QuickLook
@@ -28,6 +33,8 @@ struct QuickLook
     Picture picture;
     DisplayChoice choice;           // what is shown
     std::vector<Stretch> stretches; // of each colour of it; none with a colour table
+    bool power = false;             // the total power is shown
+    bool decibels = false;          // stretches are in decibels
 };
 
 // Renders a small picture of a file: from the coarsest level that is large enough, with its default display channels,

@@ -3,8 +3,10 @@
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/iencodedblocks.h"
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/ilayoutdataset.h"
 #include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/ioverviewmanager.h"
@@ -26,8 +28,10 @@
 #include "toolkit/ogc/cs/geocodinginfo.h"
 #include "toolkit/ogc/cs/icrs.h"
 
+#include <filesystem>
 #include <memory>
 #include <optional>
+#include <system_error>
 
 namespace krv::operations
 {
@@ -158,6 +162,45 @@ std::vector<MathModelFacts> FindModels(const SourceFile& oFile)
     return oList;
 }
 
+StorageFacts DescribeBlocks(krv::datasources::IEncodedBlocks& oBlocks)
+{
+    const EncodedForm oForm = oBlocks.GetEncodedForm(1);
+    return {oForm.mnBlockWidth, oForm.mnBlockHeight, oForm.mbWholeBlocks, oForm.moCodec,
+            oForm.mbLossy,      oForm.mnPredictor,   oForm.mbSeparate,    oForm.mbBigEndian};
+}
+
+void DescribeStorage(const SourceFile& oFile, FileInfo& oInfo)
+{
+    IDataset& oDataset = oFile.GetDataset();
+    std::error_code oError;
+    const std::uintmax_t nBytes = std::filesystem::file_size(oFile.GetName(), oError);
+    if (!oError)
+        oInfo.fileBytes = nBytes;
+    if (auto* const poBlocks = dynamic_cast<IEncodedBlocks*>(&oDataset))
+        oInfo.storage =
+            Attempt(oFile, "how its blocks are stored", [&] { return std::optional(DescribeBlocks(*poBlocks)); });
+    if (auto* const poLayout = dynamic_cast<ILayoutDataset*>(&oDataset))
+    {
+        oInfo.variant = poLayout->GetVariant();
+        oInfo.cloudReasons = Attempt(oFile, "its layout", [&] { return poLayout->CheckCloudLayout(); });
+    }
+}
+
+void DescribePlace(const SourceFile& oFile, FileInfo& oInfo)
+{
+    const std::optional<ImagePlace> oPlace = ImagePlace::Find(oFile);
+    if (!oPlace)
+        return;
+    oInfo.placedBy = oPlace->GetKind();
+    oInfo.geographic = oPlace->FindGeographicBounds();
+    if (oPlace->GetKind() != PlacedBy::eTransform)
+        return;
+    const auto& oGeocoding = dynamic_cast<IGeocodedDataset&>(oFile.GetDataset()).GetGeocoding();
+    oInfo.bounds = OutlineOf(oGeocoding, oInfo.width, oInfo.height);
+    oInfo.pixelSize = PixelSize{oGeocoding.GetColumnSpacing(), oGeocoding.GetRowSpacing(),
+                                oPlace->GetCRS() != nullptr ? oPlace->GetCRS()->GetUnitName() : std::string()};
+}
+
 } // namespace
 
 FileInfo GatherInfo(const SourceFile& oFile)
@@ -176,8 +219,8 @@ FileInfo GatherInfo(const SourceFile& oFile)
     if (!oGroups.empty()) // a file may hold other things than channels
     {
         const LevelReader oReader = oFile.Read(oGroups.front().channels);
-        oInfo.blockWidth = oReader.Get().GetTileWidth();
-        oInfo.blockHeight = oReader.Get().GetTileHeight();
+        oInfo.tileWidth = oReader.Get().GetTileWidth();
+        oInfo.tileHeight = oReader.Get().GetTileHeight();
         oInfo.overviews = Attempt(oFile, "the levels", [&] { return FindLevels(oReader.Get()); });
     }
     for (unsigned int i = 1; i <= oRaster.GetChanCount(); ++i)
@@ -185,6 +228,13 @@ FileInfo GatherInfo(const SourceFile& oFile)
     oInfo.metadata = oMetadata.GetFileMetadata();
     oInfo.crs = Attempt(oFile, "the reference system", [&] { return FindCrs(oFile); });
     oInfo.geocoding = FindGeocoding(oFile, oInfo.crs.has_value());
+    DescribeStorage(oFile, oInfo);
+    Attempt(oFile, "its place on the ground",
+            [&]
+            {
+                DescribePlace(oFile, oInfo);
+                return true;
+            });
     oInfo.bitmaps = Attempt(oFile, "the bitmaps", [&] { return FindBitmaps(oFile); });
     oInfo.mathModels = FindModels(oFile);
     if (const auto* const poLinked = dynamic_cast<ILinkedDataset*>(&oDataset))

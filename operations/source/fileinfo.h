@@ -4,6 +4,8 @@
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/raster/datatype.h"
 #include "operations/api.h"
+#include "operations/source/imageplace.h"
+#include "operations/source/mapwindow.h"
 
 #include <array>
 #include <cstddef>
@@ -74,6 +76,27 @@ struct MathModelFacts
     std::optional<double> accuracy; // metres on the ground, as the provider states it
 };
 
+// How the pixels are stored, of formats that tell.
+struct StorageFacts
+{
+    unsigned int blockWidth = 0;
+    unsigned int blockHeight = 0;
+    bool tiled = true;       // else in strips, which are as wide as the image and end with it
+    std::string compression; // NONE, DEFLATE and so on; empty when it has no name
+    bool lossy = false;
+    unsigned int predictor = 1; // 1: none, 2: differences along the rows, 3: byte planes of reals with differences
+    bool separate = false;      // every channel in blocks of its own
+    bool bigEndian = false;
+};
+
+// The size of a pixel on the ground, along a row and along a column.
+struct PixelSize
+{
+    double x = 0;
+    double y = 0;
+    std::string unit; // empty when no reference system says it
+};
+
 // Everything known of a file. What has no value is not there; empty texts and lists are.
 struct FileInfo
 {
@@ -81,8 +104,17 @@ struct FileInfo
     std::optional<std::string> format;
     unsigned int width = 0;
     unsigned int height = 0;
-    unsigned int blockWidth = 0;
-    unsigned int blockHeight = 0;
+    unsigned int tileWidth = 0; // the tile in which a program best reads
+    unsigned int tileHeight = 0;
+    std::optional<StorageFacts> storage;
+    std::string variant; // of the format, such as "BigTIFF"; empty when it has none
+    std::optional<std::uint64_t> fileBytes;
+    // What keeps the file from being read in few requests over a network; nothing for formats without such a layout.
+    std::optional<std::vector<std::string>> cloudReasons;
+    std::optional<PlacedBy> placedBy;
+    std::optional<MapBounds> bounds;            // of the outer edges; of files with a transform
+    std::optional<GeographicBounds> geographic; // the same in degrees
+    std::optional<PixelSize> pixelSize;         // of files with a transform
     std::vector<ChannelFacts> channels;
     krv::datasources::MetadataMap metadata;
     std::optional<CrsFacts> crs;

@@ -4,9 +4,12 @@
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/iomanager/datasetmanager.h"
+#include "datasources/metadata/pixelstatistics.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/ioverviewaccessor.h"
+#include "datasources/reader/validitysource.h"
 #include "operations/job/exceptions.h"
+#include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 
@@ -17,6 +20,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cmath>
 #include <cstring>
 
 namespace krv::operations
@@ -27,6 +31,8 @@ using krv::datasources::IRasterReader;
 
 namespace
 {
+
+constexpr char NO_DATA[] = "NO_DATA_VALUE";
 
 // A file whose format does not update files is updated by what lies beside it.
 std::unique_ptr<krv::datasources::IDataset> OpenDataset(const std::string& name, AccessMode eMode)
@@ -126,11 +132,20 @@ LevelReader LevelReader::AtLeast(std::unique_ptr<IRasterReader> poFull, unsigned
     return {std::move(poFull), nullptr, nullptr};
 }
 
-SourceFile::SourceFile(const std::string& name, AccessMode eMode)
-    : moName(name), meMode(eMode), moIdentity(name), mpoDataset(OpenDataset(name, eMode)),
+SourceFile::SourceFile(const std::string& name, AccessMode eMode, const std::optional<std::string>& noData)
+    : moName(name), meMode(eMode), moNoData(noData), moIdentity(name), mpoDataset(OpenDataset(name, eMode)),
       mpoRaster(dynamic_cast<krv::datasources::IRasterDataset*>(mpoDataset.get())),
       moMetadata(mpoDataset->ReadAuxiliaryData())
 {
+    if (!noData)
+        return;
+    if (!krv::datasources::ParseNoData(*noData))
+        throw RequestException("the no-data value \"" + *noData + "\" is no number");
+    moMetadata.SetFileMetadataValue(NO_DATA, *noData);
+    for (unsigned int i = 1; i <= moMetadata.GetChannelCount(); ++i)
+        if (moMetadata.GetChanMetadata(i).contains(NO_DATA))
+            moMetadata.RemoveChanMetadataValue(NO_DATA, i);
+    krv::datasources::DropStatistics(moMetadata);
 }
 
 SourceFile::~SourceFile() = default;
@@ -141,7 +156,7 @@ std::unique_ptr<SourceFile> SourceFile::OpenAgain(bool bUpdated) const
         return nullptr;
     try
     {
-        auto poAgain = std::make_unique<SourceFile>(moName);
+        auto poAgain = std::make_unique<SourceFile>(moName, eReadOnly, moNoData);
         // What this process writes into a file that it updates changes size and time, not what is opened.
         const Identity oNow(moName);
         const bool bSame = bUpdated || meMode == eUpdate
@@ -210,6 +225,28 @@ OptionalNoData SourceFile::GetNoData(unsigned int nChannel) const
         krv::nspio::Warning::Warn(
             fmt::format("{}: the no-data value \"{}\" is no number and is not used", moName, text));
     return oValue;
+}
+
+ValueScale SourceFile::GetScale(unsigned int nChannel) const
+{
+    ValueScale oScale;
+    if (nChannel == 0 || nChannel > moMetadata.GetChannelCount())
+        return oScale;
+    const auto Read = [&](const char* pKey, double nElse)
+    {
+        const auto oValue = krv::ParseNumber<double>(moMetadata.GetChanMetadataValue(pKey, nChannel));
+        return oValue && std::isfinite(*oValue) ? *oValue : nElse;
+    };
+    oScale.scale = Read("Scale", 1);
+    oScale.offset = Read("Offset", 0);
+    return oScale.scale == 0 ? ValueScale() : oScale;
+}
+
+std::unique_ptr<krv::datasources::ValiditySource> SourceFile::MakeValidity(const std::vector<unsigned int>& oChannels,
+                                                                           bool bNoData) const
+{
+    return std::make_unique<krv::datasources::ValiditySource>(mpoDataset.get(), moMetadata, oChannels,
+                                                              krv::gobs::eAllChannels, bNoData);
 }
 
 std::vector<unsigned int> SourceFile::CheckChannels(const std::vector<unsigned int>& oChannels) const

@@ -19,6 +19,7 @@ class IDataset;
 class IOverviewReaderAccessor;
 class IRasterDataset;
 class IRasterReader;
+class ValiditySource;
 } // namespace krv::datasources
 
 namespace krv::operations
@@ -30,6 +31,16 @@ KRV_OPERATIONS_API std::string WhyUnreadable(const std::string& file);
 
 // A channel's no-data value, when it has one.
 using OptionalNoData = std::optional<krv::datasources::NoDataValue>;
+
+// What a channel's values stand for: value * scale + offset.
+struct ValueScale
+{
+    double scale = 1;
+    double offset = 0;
+
+    double operator()(double nValue) const { return nValue * scale + offset; }
+    bool IsIdentity() const { return scale == 1 && offset == 0; }
+};
 
 // A reader and, for a level, what it stands on.
 class KRV_OPERATIONS_API LevelReader
@@ -66,8 +77,10 @@ struct ChannelGroup
 class KRV_OPERATIONS_API SourceFile
 {
 public:
-    // Passes what the manager throws.
-    explicit SourceFile(const std::string& name, AccessMode eMode = eReadOnly);
+    // noData: taken for the no-data value of all channels, in place of what the file records. Passes what the manager
+    // throws, and throws RequestException for a text that is no number.
+    explicit SourceFile(const std::string& name, AccessMode eMode = eReadOnly,
+                        const std::optional<std::string>& noData = {});
     ~SourceFile();
 
     // The same file opened once more for reading, for a thread of its own; null when that cannot be: it is another by
@@ -95,6 +108,14 @@ public:
     std::string GetNoDataText(unsigned int nChannel) const;
     // The number in that text; a text that is none counts as no value, and a warning says so.
     OptionalNoData GetNoData(unsigned int nChannel) const;
+
+    // By the channel's tags "Scale" and "Offset"; the identity where they are no numbers.
+    ValueScale GetScale(unsigned int nChannel) const;
+
+    // Which pixels of rasters of these channels are valid, by mask, alpha and, with bNoData, the no-data values: a
+    // pixel without data in all that have one.
+    std::unique_ptr<krv::datasources::ValiditySource> MakeValidity(const std::vector<unsigned int>& oChannels,
+                                                                   bool bNoData = true) const;
 
     // All channels for an empty list. Throws RequestException for a channel that the file does not have.
     std::vector<unsigned int> CheckChannels(const std::vector<unsigned int>& oChannels) const;
@@ -126,6 +147,7 @@ private:
 
     std::string moName;
     AccessMode meMode;
+    std::optional<std::string> moNoData;
     Identity moIdentity; // as it was just before it was opened
     std::unique_ptr<krv::datasources::IDataset> mpoDataset;
     krv::datasources::IRasterDataset* mpoRaster; // a facet of the dataset

@@ -7,12 +7,14 @@
 #include "gobs/mask/samplematch.h"
 #include "gobs/raster/pixelvalue.h"
 #include "gobs/raster/raster.h"
+#include "operations/job/exceptions.h"
 #include "operations/source/fileworkers.h"
 #include "toolkit/threading/foreachitem.h"
 
 #include <algorithm>
 #include <array>
 #include <cmath>
+#include <functional>
 #include <limits>
 #include <type_traits>
 
@@ -184,10 +186,21 @@ template <typename T>
 class RunStatistics
 {
 public:
+    void CountInto(const HistogramBins& oBins)
+    {
+        moBins = oBins;
+        moCounts.assign(oBins.count, 0);
+    }
+
     void Add(const T* pValues, std::size_t n)
     {
         if (n == 0)
             return;
+        for (std::size_t i = 0; i < n && !moCounts.empty(); ++i)
+        {
+            const double nBin = (static_cast<double>(pValues[i]) - moBins.low) * moBins.perValue;
+            ++moCounts[std::min(static_cast<std::size_t>(std::max(nBin, 0.0)), moCounts.size() - 1)];
+        }
         T nLow = mnLow, nHigh = mnHigh;
         for (std::size_t i = 0; i < n; ++i)
         {
@@ -208,10 +221,12 @@ public:
         mnHigh = oOther.mnHigh > mnHigh ? oOther.mnHigh : mnHigh;
         mnCount += oOther.mnCount;
         moSums.Merge(oOther.moSums);
+        std::transform(moCounts.begin(), moCounts.end(), oOther.moCounts.begin(), moCounts.begin(), std::plus<>());
     }
 
     void Report(ChannelStatistics& oResult) const
     {
+        oResult.histogram = moCounts;
         oResult.valid = mnCount;
         if (mnCount == 0)
             return;
@@ -236,6 +251,8 @@ private:
     T mnLow = std::numeric_limits<T>::max();
     T mnHigh = std::numeric_limits<T>::lowest();
     SumsFor<T> moSums;
+    HistogramBins moBins;
+    std::vector<std::uint64_t> moCounts; // none unless they are wanted
 };
 
 bool IsMasked(const unsigned char* pValid, std::uint64_t nPixel)
@@ -255,6 +272,7 @@ public:
         const auto& oSame = dynamic_cast<const PartGatherer&>(oOther);
         moCounts.noData += oSame.moCounts.noData;
         moCounts.masked += oSame.moCounts.masked;
+        moCounts.transparent += oSame.moCounts.transparent;
         moCounts.nan += oSame.moCounts.nan;
         moCounts.infinite += oSame.moCounts.infinite;
         moStatistics.Merge(oSame.moStatistics);
@@ -267,7 +285,16 @@ public:
         return oResult;
     }
 
+    void CountInto(const HistogramBins& oBins) override { moStatistics.CountInto(oBins); }
+
 protected:
+    // A pixel that is left out, by alpha or by something else.
+    void CountMasked(std::uint64_t nPixel, const unsigned char* pOpaque)
+    {
+        ++moCounts.masked;
+        moCounts.transparent += pOpaque != nullptr && IsMasked(pOpaque, nPixel) ? 1 : 0;
+    }
+
     krv::gobs::SampleMatch<T> moNoData;
     ChannelStatistics moCounts;
     RunStatistics<Value> moStatistics;
@@ -280,8 +307,8 @@ class RealGatherer : public PartGatherer<T, T>
 public:
     using PartGatherer<T, T>::PartGatherer;
 
-    void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride,
-             const unsigned char* pValid) override
+    void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride, const unsigned char* pValid,
+             const unsigned char* pOpaque) override
     {
         const T* pFrom = reinterpret_cast<const T*>(pFirst);
         for (std::uint64_t nDone = 0; nDone < nPixels; nDone += RUN)
@@ -289,7 +316,8 @@ public:
             const auto n = static_cast<std::size_t>(std::min<std::uint64_t>(RUN, nPixels - nDone));
             const T* pRun = pFrom + nDone * nStride;
             if (pValid != nullptr)
-                moStatistics.Add(moValid.data(), SiftMasked(pRun, n, nStride, pValid + nDone / 8));
+                moStatistics.Add(moValid.data(), SiftMasked(pRun, n, nStride, pValid + nDone / 8,
+                                                            pOpaque != nullptr ? pOpaque + nDone / 8 : nullptr));
             else if (nStride == 1 && !moNoData.IsSet() && std::is_integral_v<T>)
                 moStatistics.Add(pRun, n);
             else
@@ -330,7 +358,8 @@ private:
         return nValid;
     }
 
-    std::size_t SiftMasked(const T* pFrom, std::size_t n, unsigned int nStride, const unsigned char* pValid)
+    std::size_t SiftMasked(const T* pFrom, std::size_t n, unsigned int nStride, const unsigned char* pValid,
+                           const unsigned char* pOpaque)
     {
         std::size_t nKept = 0;
         for (std::size_t i = 0; i < n; ++i)
@@ -338,8 +367,10 @@ private:
             const T nValue = pFrom[i * nStride];
             if (!IsMasked(pValid, i))
                 nKept += Sift(&nValue, 1, 1, nKept);
+            else if (moNoData.Matches(nValue))
+                ++moCounts.noData;
             else
-                ++(moNoData.Matches(nValue) ? moCounts.noData : moCounts.masked);
+                this->CountMasked(i, pOpaque);
         }
         return nKept;
     }
@@ -366,8 +397,8 @@ class ComplexGatherer : public PartGatherer<T, double>
 public:
     using PartGatherer<T, double>::PartGatherer;
 
-    void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride,
-             const unsigned char* pValid) override
+    void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride, const unsigned char* pValid,
+             const unsigned char* pOpaque) override
     {
         const T* pFrom = reinterpret_cast<const T*>(pFirst);
         std::size_t nValid = 0;
@@ -378,7 +409,7 @@ public:
             if (moNoData.Matches(nReal, nImaginary))
                 ++moCounts.noData;
             else if (pValid != nullptr && IsMasked(pValid, i))
-                ++moCounts.masked;
+                this->CountMasked(i, pOpaque);
             else if (std::isnan(static_cast<double>(nReal)) || std::isnan(static_cast<double>(nImaginary)))
                 ++moCounts.nan;
             else if (!std::isfinite(nMagnitude))
@@ -406,6 +437,25 @@ private:
     }
 };
 
+// What alpha alone says of pixels.
+class Opacity
+{
+public:
+    Opacity(const SourceFile& oFile, unsigned int nAlpha) : moReader(oFile.Read({nAlpha})), moSource(moReader.Get()) {}
+
+    std::unique_ptr<const krv::gobs::Mask> Read(const krv::gobs::Raster& oTile) const
+    {
+        const std::unique_ptr<krv::gobs::Raster> poAlpha(
+            moReader.Get().ReadRaster(static_cast<unsigned int>(oTile.GetX()), static_cast<unsigned int>(oTile.GetY()),
+                                      oTile.GetWidth(), oTile.GetHeight()));
+        return std::unique_ptr<const krv::gobs::Mask>(moSource.BuildMask(*poAlpha));
+    }
+
+private:
+    LevelReader moReader;
+    ValiditySource moSource;
+};
+
 // What a thread needs: the channels of one type that are looked at, and what says which pixels are valid beside the
 // values of their own channels; null when nothing does.
 struct Worker
@@ -413,19 +463,31 @@ struct Worker
     FilePointer file;
     LevelReader reader;
     std::unique_ptr<ValiditySource> validity;
+    std::unique_ptr<Opacity> opacity; // null where there is no alpha
 };
 
 using Gatherers = std::vector<std::unique_ptr<StatisticsGatherer>>;
 
-Gatherers MakeGatherers(const krv::gobs::DataType& oType, const std::vector<OptionalNoData>& oNoData)
+// How the values of a channel are gathered.
+struct Gathering
+{
+    OptionalNoData noData;
+    std::optional<HistogramBins> bins;
+};
+
+Gatherers MakeGatherers(const krv::gobs::DataType& oType, const std::vector<Gathering>& oHow)
 {
     Gatherers oGatherers;
-    for (const OptionalNoData& oValue : oNoData)
-        oGatherers.push_back(StatisticsGatherer::Make(oType, oValue));
+    for (const Gathering& oOne : oHow)
+    {
+        oGatherers.push_back(StatisticsGatherer::Make(oType, oOne.noData));
+        if (oOne.bins)
+            oGatherers.back()->CountInto(*oOne.bins);
+    }
     return oGatherers;
 }
 
-// Of one tile; oNoData: one per channel.
+// Of one tile; oHow: one per channel.
 struct TileStatistics
 {
     Gatherers channels;
@@ -444,7 +506,7 @@ std::unique_ptr<krv::gobs::Mask> WithoutBackground(const krv::gobs::Mask& oValid
     return poMask;
 }
 
-TileStatistics Gather(const Worker& oWorker, std::uint64_t nTile, const std::vector<OptionalNoData>& oNoData)
+TileStatistics Gather(const Worker& oWorker, std::uint64_t nTile, const std::vector<Gathering>& oHow)
 {
     const std::unique_ptr<krv::gobs::Raster> poTile(oWorker.reader.Get().GetRaster(static_cast<unsigned int>(nTile)));
     const auto nValueBytes = static_cast<std::size_t>(poTile->GetDataType().GetValueBits() / 8);
@@ -453,14 +515,16 @@ TileStatistics Gather(const Worker& oWorker, std::uint64_t nTile, const std::vec
         oWorker.validity != nullptr ? oWorker.validity->BuildMask(*poTile) : nullptr);
     const unsigned char* const pValid =
         poMask != nullptr && poMask->CountSet() != nPixels ? poMask->GetBits() : nullptr;
-    TileStatistics oResult{MakeGatherers(poTile->GetDataType(), oNoData), poTile->GetBufferSize()};
-    for (std::size_t c = 0; c < oNoData.size(); ++c)
+    const auto poOpaque = pValid != nullptr && oWorker.opacity != nullptr ? oWorker.opacity->Read(*poTile) : nullptr;
+    const unsigned char* const pOpaque = poOpaque != nullptr ? poOpaque->GetBits() : nullptr;
+    TileStatistics oResult{MakeGatherers(poTile->GetDataType(), oHow), poTile->GetBufferSize()};
+    for (std::size_t c = 0; c < oHow.size(); ++c)
     {
         const krv::gobs::IMaskBuilder* const poOwn =
             oWorker.validity != nullptr ? oWorker.validity->GetChannelMask(c) : nullptr;
         const auto poChannel = poOwn != nullptr ? WithoutBackground(*poMask, *poOwn, *poTile) : nullptr;
         oResult.channels[c]->Add(poTile->GetBuffer() + c * nValueBytes, nPixels, poTile->GetChansCount(),
-                                 poChannel != nullptr ? poChannel->GetBits() : pValid);
+                                 poChannel != nullptr ? poChannel->GetBits() : pValid, pOpaque);
     }
     return oResult;
 }
@@ -476,7 +540,7 @@ std::unique_ptr<ValiditySource> FindValidity(const SourceFile& oFile, const std:
         return IsNone(nChannel) && !oFile.GetNoDataText(nChannel).empty();
     };
     const bool bUnread = std::any_of(oChannels.begin(), oChannels.end(), IsUnread);
-    auto poSource = std::make_unique<ValiditySource>(&oFile.GetDataset(), oChannels, krv::gobs::eAllChannels, !bUnread);
+    auto poSource = oFile.MakeValidity(oChannels, !bUnread);
     // A pixel without data in all channels that have a value is none in those that have not.
     const bool bPixels = poSource->HasNoData() && std::any_of(oChannels.begin(), oChannels.end(), IsNone);
     return poSource->HasBitmap() || poSource->HasAlpha() || bPixels ? std::move(poSource) : nullptr;
@@ -486,10 +550,10 @@ std::unique_ptr<ValiditySource> FindValidity(const SourceFile& oFile, const std:
 // merged in their order, so that sums of reals come out the same whoever gathers them.
 std::vector<ChannelStatistics> GatherTiles(FileWorkers<Worker>& oWorkers,
                                            const krv::datasources::IRasterReader& oReader,
-                                           const std::vector<OptionalNoData>& oNoData, const Progress& oProgress,
+                                           const std::vector<Gathering>& oHow, const Progress& oProgress,
                                            krv::threading::IExecutor* poExecutor)
 {
-    const Gatherers oTotal = MakeGatherers(oReader.GetDataType(), oNoData);
+    const Gatherers oTotal = MakeGatherers(oReader.GetDataType(), oHow);
     ProgressCounter oCounter(oProgress, "stats",
                              krv::gobs::BufferBytes(oReader.GetWidth(), oReader.GetHeight(), oReader.GetChansCount(),
                                                     oReader.GetDataType()));
@@ -499,7 +563,7 @@ std::vector<ChannelStatistics> GatherTiles(FileWorkers<Worker>& oWorkers,
         [&](std::uint64_t nTile)
         {
             const typename FileWorkers<Worker>::Use oWorker(oWorkers);
-            return Gather(*oWorker, nTile, oNoData);
+            return Gather(*oWorker, nTile, oHow);
         },
         [&](const TileStatistics& oTile)
         {
@@ -515,22 +579,132 @@ std::vector<ChannelStatistics> GatherTiles(FileWorkers<Worker>& oWorkers,
 
 // Of channels of one type.
 std::vector<ChannelStatistics> StatisticsOf(const SourceFile& oFile, const std::vector<unsigned int>& oChannels,
-                                            bool bRaw, const Progress& oProgress, krv::threading::IExecutor* poExecutor)
+                                            const std::vector<Gathering>& oHow, bool bRaw, const Progress& oProgress,
+                                            krv::threading::IExecutor* poExecutor)
 {
-    std::vector<OptionalNoData> oNoData;
-    for (const unsigned int nChannel : oChannels)
-        oNoData.push_back(oFile.GetNoData(nChannel));
     FileWorkers<Worker> oWorkers(oFile,
                                  [&](FilePointer poFile)
                                  {
                                      LevelReader oReader = poFile->Read(oChannels);
                                      oReader.Get().SetMargins(0, 0, eMirror);
                                      auto poValidity = bRaw ? nullptr : FindValidity(*poFile, oChannels);
+                                     auto poOpacity =
+                                         poValidity != nullptr && poValidity->HasAlpha()
+                                             ? std::make_unique<Opacity>(
+                                                   *poFile, krv::datasources::FindAlpha(poFile->GetMetadata()))
+                                             : nullptr;
                                      return std::make_unique<Worker>(std::move(poFile), std::move(oReader),
-                                                                     std::move(poValidity));
+                                                                     std::move(poValidity), std::move(poOpacity));
                                  });
     const LevelReader oWhole = oFile.Read(oChannels);
-    return GatherTiles(oWorkers, oWhole.Get(), oNoData, oProgress, poExecutor);
+    return GatherTiles(oWorkers, oWhole.Get(), oHow, oProgress, poExecutor);
+}
+
+constexpr std::size_t FINE_BINS = 65536;
+
+double ToDouble(const ExactNumber& oNumber)
+{
+    return std::visit([](auto nNumber) { return static_cast<double>(nNumber); }, oNumber);
+}
+
+// Whether each bin holds one integer.
+bool IsExact(const ChannelStatistics& oStatistics)
+{
+    return oStatistics.minimum && !std::holds_alternative<double>(*oStatistics.minimum) &&
+           ToDouble(*oStatistics.maximum) - ToDouble(*oStatistics.minimum) < static_cast<double>(FINE_BINS);
+}
+
+// Many bins between the extremes; none without a valid value.
+std::optional<HistogramBins> MakeFineBins(const ChannelStatistics& oStatistics)
+{
+    if (!oStatistics.minimum)
+        return std::nullopt;
+    const double nLow = ToDouble(*oStatistics.minimum), nExtent = ToDouble(*oStatistics.maximum) - nLow;
+    if (IsExact(oStatistics))
+        return HistogramBins{nLow, 1, static_cast<std::size_t>(nExtent) + 1};
+    const double nPerValue = static_cast<double>(FINE_BINS) / nExtent;
+    return std::isfinite(nPerValue) && nPerValue > 0 ? HistogramBins{nLow, nPerValue, FINE_BINS}
+                                                     : HistogramBins{nLow, 0, 1};
+}
+
+// The value that a share of the counted ones does not exceed; between the borders of a bin by a straight line.
+double FindPercentile(const std::vector<std::uint64_t>& oCounts, const HistogramBins& oBins, bool bExact,
+                      std::uint64_t nAll, double nPercent)
+{
+    const double nWanted = std::max(std::ceil(static_cast<double>(nAll) * nPercent / 100), 1.0);
+    double nBefore = 0;
+    for (std::size_t nBin = 0; nBin < oCounts.size(); ++nBin)
+    {
+        const auto nHere = static_cast<double>(oCounts[nBin]);
+        if (nBefore + nHere >= nWanted && nHere > 0)
+        {
+            const double nAt = static_cast<double>(nBin) + (bExact ? 0 : (nWanted - nBefore) / nHere);
+            return oBins.perValue > 0 ? oBins.low + nAt / oBins.perValue : oBins.low;
+        }
+        nBefore += nHere;
+    }
+    return oBins.low;
+}
+
+// The fine bins put together to those that were asked for.
+void CoarsenHistogram(const std::vector<std::uint64_t>& oFine, const HistogramBins& oBins, bool bExact,
+                      std::size_t nBins, ChannelStatistics& oStatistics)
+{
+    const double nHalf = bExact ? 0.5 : 0;
+    oStatistics.histogramLow = oBins.low - nHalf;
+    oStatistics.histogramHigh =
+        bExact ? oBins.low + static_cast<double>(oFine.size()) - nHalf : ToDouble(*oStatistics.maximum);
+    oStatistics.histogram.assign(nBins, 0);
+    for (std::size_t n = 0; n < oFine.size(); ++n)
+    {
+        const double nAt =
+            (static_cast<double>(n) + 0.5) * static_cast<double>(nBins) / static_cast<double>(oFine.size());
+        oStatistics.histogram[std::min(static_cast<std::size_t>(nAt), nBins - 1)] += oFine[n];
+    }
+}
+
+// Reads the file a second time, now that the extremes are known.
+void AddDistribution(const SourceFile& oFile, const std::vector<unsigned int>& oChannels, std::vector<Gathering> oHow,
+                     const StatisticsRequest& oRequest, std::vector<ChannelStatistics>& oResults,
+                     const Progress& oProgress, krv::threading::IExecutor* poExecutor)
+{
+    for (std::size_t i = 0; i < oResults.size(); ++i)
+        oHow[i].bins = MakeFineBins(oResults[i]);
+    const auto oCounted = StatisticsOf(oFile, oChannels, oHow, oRequest.raw, oProgress, poExecutor);
+    for (std::size_t i = 0; i < oResults.size(); ++i)
+    {
+        if (!oHow[i].bins)
+            continue;
+        const std::vector<std::uint64_t>& oFine = oCounted[i].histogram;
+        const bool bExact = IsExact(oResults[i]);
+        // What values stand for may count the other way round.
+        const bool bTurned = oRequest.unscale && oFile.GetScale(oChannels[i]).scale < 0;
+        for (const double nPercent : oRequest.percentiles)
+            oResults[i].percentiles.push_back(
+                FindPercentile(oFine, *oHow[i].bins, bExact, oResults[i].valid, bTurned ? 100 - nPercent : nPercent));
+        if (oRequest.bins != 0)
+            CoarsenHistogram(oFine, *oHow[i].bins, bExact, oRequest.bins, oResults[i]);
+    }
+}
+
+// What the values stand for, by a factor that may be negative.
+void Unscale(const ValueScale& oScale, ChannelStatistics& oStatistics)
+{
+    if (oScale.IsIdentity() || !oStatistics.minimum)
+        return;
+    double nLow = oScale(ToDouble(*oStatistics.minimum)), nHigh = oScale(ToDouble(*oStatistics.maximum));
+    oStatistics.minimum = std::min(nLow, nHigh);
+    oStatistics.maximum = std::max(nLow, nHigh);
+    oStatistics.mean = oScale(*oStatistics.mean);
+    oStatistics.deviation = *oStatistics.deviation * std::fabs(oScale.scale);
+    for (double& nValue : oStatistics.percentiles)
+        nValue = oScale(nValue);
+    oStatistics.histogramLow = oScale(oStatistics.histogramLow);
+    oStatistics.histogramHigh = oScale(oStatistics.histogramHigh);
+    if (oScale.scale > 0)
+        return;
+    std::reverse(oStatistics.histogram.begin(), oStatistics.histogram.end());
+    std::swap(oStatistics.histogramLow, oStatistics.histogramHigh);
 }
 
 // Pixels that are not valid are NaN, which is the no-data value.
@@ -547,11 +721,13 @@ std::vector<ChannelStatistics> PowerStatistics(const SourceFile& oFile, const St
                                  [&Open](FilePointer poFile)
                                  {
                                      LevelReader oReader(Open(*poFile), nullptr, nullptr);
-                                     return std::make_unique<Worker>(std::move(poFile), std::move(oReader), nullptr);
+                                     return std::make_unique<Worker>(std::move(poFile), std::move(oReader), nullptr,
+                                                                     nullptr);
                                  });
     const auto poReader = Open(oFile);
     const std::string noData = krv::datasources::GetNoDataText(poReader->GetAuxiliaryData(), 1);
-    auto oResults = GatherTiles(oWorkers, *poReader, {krv::datasources::ParseNoData(noData)}, oProgress, poExecutor);
+    auto oResults =
+        GatherTiles(oWorkers, *poReader, {{krv::datasources::ParseNoData(noData), {}}}, oProgress, poExecutor);
     oResults.front().type = poReader->GetDataType();
     oResults.front().noDataText = noData;
     return oResults;
@@ -576,6 +752,11 @@ std::unique_ptr<StatisticsGatherer> StatisticsGatherer::Make(const krv::gobs::Da
 std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile, const StatisticsRequest& oRequest,
                                                  const Progress& oProgress, krv::threading::IExecutor* poExecutor)
 {
+    if (std::any_of(oRequest.percentiles.begin(), oRequest.percentiles.end(),
+                    [](double nPercent) { return !(nPercent >= 0 && nPercent <= 100); }))
+        throw RequestException("percentiles lie between 0 and 100");
+    if (oRequest.power && (oRequest.bins != 0 || !oRequest.percentiles.empty()))
+        throw RequestException("a histogram and percentiles of the power take a file of it: krv convert --power");
     if (oRequest.power)
         return PowerStatistics(oFile, oRequest, oProgress, poExecutor);
     const auto oChannels = oFile.CheckChannels(oRequest.channels);
@@ -593,7 +774,12 @@ std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile, const 
         }
         if (oGroup.channels.empty())
             continue;
-        auto oFound = StatisticsOf(oFile, oGroup.channels, oRequest.raw, oProgress, poExecutor);
+        std::vector<Gathering> oHow;
+        for (const unsigned int nChannel : oGroup.channels)
+            oHow.push_back({oFile.GetNoData(nChannel), std::nullopt});
+        auto oFound = StatisticsOf(oFile, oGroup.channels, oHow, oRequest.raw, oProgress, poExecutor);
+        if (oRequest.bins != 0 || !oRequest.percentiles.empty())
+            AddDistribution(oFile, oGroup.channels, oHow, oRequest, oFound, oProgress, poExecutor);
         for (std::size_t i = 0; i < oFound.size(); ++i)
             oResults[oGroup.positions[i]] = std::move(oFound[i]);
     }
@@ -603,6 +789,8 @@ std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile, const 
         oResults[i].type = oFile.GetType(oChannels[i]);
         if (!oResults[i].alpha)
             oResults[i].noDataText = oFile.GetNoDataText(oChannels[i]);
+        if (oRequest.unscale)
+            Unscale(oFile.GetScale(oChannels[i]), oResults[i]);
     }
     return oResults;
 }

@@ -35,12 +35,29 @@ struct ChannelStatistics
     std::uint64_t valid = 0;
     std::uint64_t noData = 0;
     std::uint64_t masked = 0;
+    std::uint64_t transparent = 0; // those of the masked ones that alpha leaves out
     std::uint64_t nan = 0;
     std::uint64_t infinite = 0;
     std::optional<ExactNumber> minimum;
     std::optional<ExactNumber> maximum;
     std::optional<double> mean;
     std::optional<double> deviation;
+    // On request. Bins of equal width from low to high; those of integers begin half a step below the minimum and end
+    // half a step above the maximum.
+    std::vector<std::uint64_t> histogram;
+    double histogramLow = 0;
+    double histogramHigh = 0;
+    // On request, one value for each share: the smallest value that so many hundredths of the valid values do not
+    // exceed. Exact for integers whose extremes are less than 65536 apart, else to a 65536th of that distance.
+    std::vector<double> percentiles;
+};
+
+// The bins in which values are counted: value v falls into bin (v - low) * perValue, cut off.
+struct HistogramBins
+{
+    double low = 0;
+    double perValue = 1;
+    std::size_t count = 0;
 };
 
 // Gathers the statistics of one channel. Exact sums for integers; for reals each run of some thousand values is summed
@@ -52,8 +69,11 @@ public:
 
     // Values of one channel, the first at pFirst, nStride values apart. pValid: a bit per pixel, the highest of a byte
     // first, or null when all are valid.
+    // pOpaque: the same for pixels that alpha leaves in; null when all are.
     virtual void Add(const unsigned char* pFirst, std::uint64_t nPixels, unsigned int nStride,
-                     const unsigned char* pValid = nullptr) = 0;
+                     const unsigned char* pValid = nullptr, const unsigned char* pOpaque = nullptr) = 0;
+    // From now on valid values are counted by their size too, in ChannelStatistics::histogram.
+    virtual void CountInto(const HistogramBins& oBins) = 0;
     // Of all values so far; more may be added afterwards. Number and no-data text are left to the caller.
     virtual ChannelStatistics Get() const = 0;
     // Adds what another one, of the same type, has gathered. The result depends on the order, in the last digits of
@@ -69,6 +89,9 @@ struct StatisticsRequest
     std::vector<unsigned int> channels; // empty: all
     bool raw = false;                   // pixels that the validity mask or alpha leaves out count too
     bool power = false;                 // of a radar scene's power, one result whose number is 0
+    std::size_t bins = 0;               // of a histogram; 0: none. The file is read a second time for it
+    std::vector<double> percentiles;    // 0 to 100; read a second time for them too
+    bool unscale = false;               // numbers are those that the values stand for (SourceFile::GetScale)
 };
 
 // One result for each channel that is asked for, in that order. Throws RequestException for a channel that is not

@@ -213,16 +213,21 @@ krv::ogc::cs::ICRS* RawDataset::ReadCRS() const
 
 void RawDataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
 {
-    const Place oPlace = Place::Current();
-    CheckWriting("the reference system cannot be written", oPlace);
+    StoreCRS(&oCRS, "the reference system cannot be written", Place::Current());
+}
+
+// Null removes it.
+void RawDataset::StoreCRS(const krv::ogc::cs::ICRS* poCRS, const char* pRefusal, const Place& oPlace) const
+{
+    CheckWriting(pRefusal, oPlace);
     if (moImage.moFiles.meKind == RawKind::eHeight)
         Refuse("the reference system of elevation tiles is fixed", oPlace);
     support::AuxXml oAuxXml = GetSidecars().GetAuxXml();
     HeaderText oHeader = moImage.moHeader;
-    const bool bHeader = HasHeader() && WriteCRS(oCRS, oHeader);
+    const bool bHeader = poCRS != nullptr && HasHeader() && WriteCRS(*poCRS, oHeader);
     if (!bHeader)
-        RemoveCRS(oHeader);
-    oAuxXml.SetCRS(bHeader ? std::string() : oCRS.GetWKT());
+        raw::RemoveCRS(oHeader);
+    oAuxXml.SetCRS(bHeader || poCRS == nullptr ? std::string() : poCRS->GetWKT());
     moImage.moHeader = std::move(oHeader);
     if (HasHeader())
         StoreHeader();
@@ -241,20 +246,26 @@ const krv::ogc::cs::GeocodingInfo& RawDataset::GetGeocoding() const
 void RawDataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
 {
     const Place oPlace = Place::Current();
-    CheckWriting("the geocoding cannot be written", oPlace);
     if (!oInfo.IsInvertible())
         Refuse("a geocoding without an inverse cannot be written", oPlace);
+    StoreGeocoding(&oInfo, "the geocoding cannot be written", oPlace);
+}
+
+// Null removes it.
+void RawDataset::StoreGeocoding(const krv::ogc::cs::GeocodingInfo* poInfo, const char* pRefusal, const Place& oPlace)
+{
+    CheckWriting(pRefusal, oPlace);
     if (!HasHeader() && moImage.moGeocoding)
         Refuse("the geocoding is said by the file itself, which has no place for another one", oPlace);
     support::AuxXml oAuxXml = GetSidecars().GetAuxXml();
     HeaderText oHeader = moImage.moHeader;
-    const bool bHeader = HasHeader() && WriteGeocoding(oInfo, ReadOwnCRS().get(), oHeader);
+    const bool bHeader = poInfo != nullptr && HasHeader() && WriteGeocoding(*poInfo, ReadOwnCRS().get(), oHeader);
     if (!bHeader)
-        RemoveGeocoding(oHeader);
-    oAuxXml.SetGeocoding(bHeader ? std::nullopt : std::optional(oInfo));
+        raw::RemoveGeocoding(oHeader);
+    oAuxXml.SetGeocoding(bHeader || poInfo == nullptr ? std::nullopt : std::optional(*poInfo));
     moImage.moHeader = std::move(oHeader);
-    moImage.moGeocoding = bHeader ? std::optional(oInfo) : std::nullopt;
-    moGeocoding = oInfo;
+    moImage.moGeocoding = bHeader ? std::optional(*poInfo) : std::nullopt;
+    moGeocoding = poInfo != nullptr ? *poInfo : krv::ogc::cs::GeocodingInfo();
     if (HasHeader())
         StoreHeader();
     StoreBeside(std::move(oAuxXml));

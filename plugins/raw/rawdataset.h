@@ -2,6 +2,7 @@
 
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/iplaceremoval.h"
 #include "plugins/raw/rawimage.h"
 #include "plugins/raw/rawwriter.h"
 #include "plugins/support/dataset.h"
@@ -31,6 +32,7 @@ struct RawOptions
 class RawDataset : public support::Dataset,
                    public krv::datasources::IGeocodedDataset,
                    public krv::datasources::IPCTDataset,
+                   public krv::datasources::IPlaceRemoval,
                    public support::FacetsBeside
 {
 public:
@@ -56,6 +58,8 @@ public:
     void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;
     const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override;
     void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) override;
+    void RemoveCRS() override { StoreCRS(nullptr, "the reference system cannot be removed", Place::Current()); }
+    void RemoveGeocoding() override { StoreGeocoding(nullptr, "the geocoding cannot be removed", Place::Current()); }
 
     // The colours of classes are table 1, of channel 1.
     std::vector<unsigned int> GetPCTList() const override;
@@ -75,6 +79,8 @@ private:
     bool HasHeader() const { return moImage.moFiles.meKind == RawKind::eEnvi; }
     std::unique_ptr<krv::ogc::cs::ICRS> ReadOwnCRS() const;
     void StoreBeside(support::AuxXml oAuxXml) const;
+    void StoreCRS(const krv::ogc::cs::ICRS* poCRS, const char* pRefusal, const Place& oPlace) const;
+    void StoreGeocoding(const krv::ogc::cs::GeocodingInfo* poInfo, const char* pRefusal, const Place& oPlace);
     HeaderText& GetHeader(const char* pWhat, const Place& oPlace) const;
     void StoreHeader() const;
     void StorePCT(const krv::gobs::PCT& oTable, const Place& oPlace);

@@ -85,6 +85,23 @@ void RecordDataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
     moGeocoding = oInfo;
 }
 
+void RecordDataset::RemoveCRS()
+{
+    CheckWriting("the reference system cannot be removed", Place::Current());
+    RecordText oRecord = moRecord;
+    oRecord.RemoveCRS();
+    Change(std::move(oRecord));
+}
+
+void RecordDataset::RemoveGeocoding()
+{
+    CheckWriting("the geocoding cannot be removed", Place::Current());
+    RecordText oRecord = moRecord;
+    oRecord.RemoveGeocoding();
+    Change(std::move(oRecord));
+    moGeocoding = {};
+}
+
 krv::datasources::IOverviewManager* RecordDataset::GetOverviewManager()
 {
     GetImage();

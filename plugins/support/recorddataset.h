@@ -1,6 +1,7 @@
 #pragma once
 
 #include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/iplaceremoval.h"
 #include "plugins/support/dataset.h"
 #include "plugins/support/overviewmanager.h"
 #include "plugins/support/writing/recordtext.h"
@@ -14,7 +15,10 @@ namespace krv::plugins::support
 // A dataset whose metadata, reference system, geocoding and directory of levels are one record: a format says where
 // that is kept, as text or in another form, and where the pixels are. Files beside add what the record lacks. Levels
 // can be made as long as the file is written.
-class RecordDataset : public Dataset, public krv::datasources::IGeocodedDataset, protected LevelStore
+class RecordDataset : public Dataset,
+                      public krv::datasources::IGeocodedDataset,
+                      public krv::datasources::IPlaceRemoval,
+                      protected LevelStore
 {
 public:
     krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
@@ -24,6 +28,8 @@ public:
     void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;
     const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override;
     void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) override;
+    void RemoveCRS() override;
+    void RemoveGeocoding() override;
     krv::datasources::IOverviewManager* GetOverviewManager() override;
 
 protected:

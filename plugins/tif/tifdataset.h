@@ -4,9 +4,11 @@
 #include "datasources/interfaces/iblockencoding.h"
 #include "datasources/interfaces/iblocktransfer.h"
 #include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/ilayoutdataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/iplaceremoval.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "plugins/support/dataset.h"
@@ -39,6 +41,8 @@ class TifDataset : public support::Dataset,
                    public krv::datasources::IMathModelDataset,
                    public krv::datasources::IStorageDataset,
                    public krv::datasources::IPagedDataset,
+                   public krv::datasources::IPlaceRemoval,
+                   public krv::datasources::ILayoutDataset,
                    public krv::datasources::IEncodedBlocks,
                    public krv::datasources::IBlockEncoding,
                    public krv::datasources::IBlockTransfer
@@ -69,6 +73,8 @@ public:
     // The identity when the file has no geocoding.
     const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override;
     void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) override;
+    void RemoveCRS() override;
+    void RemoveGeocoding() override;
 
     std::vector<unsigned int> GetBitmapList() const override;
     krv::datasources::IRasterIO* GetBitmapIO(const std::vector<unsigned int>& oBitmaps) override;
@@ -103,6 +109,8 @@ public:
     unsigned int CountFurtherImages() const override;
 
     std::optional<std::uint64_t> GetUnusedBytes() override;
+    std::string GetVariant() override;
+    std::optional<std::vector<std::string>> CheckCloudLayout() override;
 
     krv::datasources::EncodedForm GetEncodedForm(unsigned int nLevel) override;
     bool ReadEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock,

@@ -99,4 +99,20 @@ void TifDataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
         });
 }
 
+void TifDataset::RemoveCRS()
+{
+    FileEditor& oEditor = GetEditor("the reference system cannot be removed", Place::Current());
+    Edit(
+        [&]
+        {
+            oEditor.LoadTags(*oEditor.GetPages().front());
+            GeoWriter(oEditor, oEditor.GetPages().front()).RemoveCRS();
+        });
+}
+
+void TifDataset::RemoveGeocoding()
+{
+    SetGeocoding(krv::ogc::cs::GeocodingInfo());
+}
+
 } // namespace krv::plugins::tif

@@ -272,12 +272,12 @@ void CompareStatistics(const Facts& oFacts, const std::string& file)
     {
         const json& oChannel = oStatistics["channels"][c];
         double nCounted = 0;
-        for (const char* pCount : {"valid", "noData", "nan", "infinite"})
+        for (const char* pCount : {"valid", "noDataCount", "nan", "infinite"})
             nCounted += oChannel[pCount].get<double>();
         EXPECT_EQ(nCounted, nPixels);
         if (!oNoData.empty() && !oFacts.IsLossy())
         {
-            EXPECT_EQ(oChannel["noData"].dump(), oNoData.at(c));
+            EXPECT_EQ(oChannel["noDataCount"].dump(), oNoData.at(c));
             const auto oMask = RunKrv({"mask", file, "--no-data", "--channels", std::to_string(c + 1), "--json"});
             EXPECT_TRUE(!oFacts.Has("no_data") || oMask.Json()["set"].dump() == oNoData.at(c)) << oMask.errors;
         }

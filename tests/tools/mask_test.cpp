@@ -203,10 +203,10 @@ TEST_F(MaskCommand, NoDataIsStoredAsItsComplement)
     // It is honoured: a pixel that is zero in one channel takes part in none.
     const json oFirst = RunKrv({"stats", moFile, "--json"}).Json()["channels"][0];
     EXPECT_EQ(oFirst["valid"], WIDTH * HEIGHT - nNone);
-    EXPECT_EQ(oFirst["noData"].get<std::int64_t>() + oFirst["masked"].get<std::int64_t>(), nNone);
+    EXPECT_EQ(oFirst["noDataCount"].get<std::int64_t>() + oFirst["masked"].get<std::int64_t>(), nNone);
     EXPECT_GT(oFirst["masked"], 0);
     const json oRaw = RunKrv({"stats", moFile, "--json", "--raw"}).Json()["channels"][0];
-    EXPECT_EQ(oRaw["valid"], WIDTH * HEIGHT - oFirst["noData"].get<std::int64_t>());
+    EXPECT_EQ(oRaw["valid"], WIDTH * HEIGHT - oFirst["noDataCount"].get<std::int64_t>());
     EXPECT_EQ(oRaw["masked"], 0);
 
     // Another bitmap takes its place.
@@ -235,7 +235,7 @@ TEST_F(MaskCommand, FailuresSayWhyOnOneLineAndChangeNothing)
         {{moFile, "--no-data", "--channels", "4"}, 2, "channel 4"},
         {{moFile, "--no-data", "--coordinates", "pixel"}, 2, "--polygon"},
         {{moFile, "--polygon", square, "--crs", "EPSG:4326", "--coordinates", "pixel"}, 2, "--crs"},
-        {{moFile, "--polygon", square, "--crs", "nonsense", "--write", "new"}, 1, "nonsense"},
+        {{moFile, "--polygon", square, "--crs", "nonsense", "--write", "new"}, 2, "nonsense"},
         {{moFile, "--polygon", "POLYGON((0 0,5 0"}, 2, "character 17"},
         {{moFile, "--polygon", "POLYGON((0 0,nan 0,4 4))"}, 2, "a number is expected"},
         {{moFile, "--polygon", "POLYGON((0 0,1e400 0,4 4))"}, 2, "a number is expected"},

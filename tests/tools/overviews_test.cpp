@@ -85,8 +85,8 @@ TEST(OverviewsVerb, InterruptStopsCleanly)
     const std::string file = MakeFile(oFolder, 6000, false);
     const std::string before = ReadFile(file);
     const ProgramRun oRun = RunProgram(KRV_PROGRAM, {"overviews", file, "--resampling", "lanczos"}, {}, 300);
-    EXPECT_EQ(oRun.code, 1);
-    EXPECT_EQ(oRun.errors, "krv: stopped\n");
+    EXPECT_EQ(oRun.code, 130);
+    EXPECT_EQ(oRun.errors, "krv: interrupted; files are as they were\n");
     EXPECT_TRUE(ReadFile(file) == before);
 }
 

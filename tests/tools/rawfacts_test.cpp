@@ -151,9 +151,9 @@ void CompareStatistics(const Facts& oFacts, const std::string& file)
     for (std::size_t n = 0; n < oListed.size(); ++n)
     {
         const json& oChannel = oFound["channels"][oListed[n] - 1];
-        EXPECT_TRUE(oNoData.empty() || oChannel["noData"].dump() == oNoData.at(n)) << oChannel["noData"];
+        EXPECT_TRUE(oNoData.empty() || oChannel["noDataCount"].dump() == oNoData.at(n)) << oChannel["noDataCount"];
         // The table's figures include no-data, and are of the parts of complex values.
-        if (oChannel["noData"] != 0 || oChannel["of"] == "magnitude")
+        if (oChannel["noDataCount"] != 0 || oChannel["of"] == "magnitude")
             continue;
         EXPECT_EQ(oChannel["nan"].dump(), oFacts.List("band_nan").at(n));
         for (const char* pWhat : {"min", "max", "mean"})

@@ -209,7 +209,7 @@ TEST(Validity, MaskAndAlphaCountInStatisticsAsInLevels)
     };
     const auto oChannels = Channels("--channels=1,2"), oRaw = Channels("--raw");
     EXPECT_EQ(oChannels[0]["valid"], nValid);
-    EXPECT_EQ(oChannels[0]["noData"], nNoData);
+    EXPECT_EQ(oChannels[0]["noDataCount"], nNoData);
     EXPECT_EQ(oChannels[0]["masked"], WIDTH * HEIGHT - nValid - nNoData);
     EXPECT_TRUE(oChannels[1]["of"] == "alpha" && oChannels[1]["mean"].is_null());
     EXPECT_EQ(oRaw[0]["valid"], WIDTH * HEIGHT - nNoData);

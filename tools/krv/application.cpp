@@ -2,7 +2,9 @@
 
 #include "toolkit/nspio/warning.h"
 #include "tools/krv/errors.h"
+#include "tools/krv/helpformatter.h"
 #include "tools/krv/interrupt.h"
+#include "tools/krv/nearestword.h"
 #include "tools/krv/threads.h"
 #include "tools/krv/verbs/verbs.h"
 
@@ -10,6 +12,7 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <memory>
 #include <mutex>
 #include <string>
 #include <vector>
@@ -20,6 +23,8 @@ namespace krv::tool
 namespace
 {
 
+constexpr int INTERRUPTED = 130;
+
 constexpr char FOOTER[] =
     "Examples:\n"
     "  krv info scene.tif                     everything known of a file\n"
@@ -27,9 +32,11 @@ constexpr char FOOTER[] =
     "  krv view scene.tif look.png --size 800 a quick look\n"
     "  krv convert scene.tif copy.tif --options COMPRESS=ZSTD\n"
     "  krv overviews scene.tif                overview levels, powers of two\n"
+    "  krv edit scene.tif --no-data 0 --crs EPSG:32633   what the file says, in place\n"
+    "  krv sample scene.tif 500020 5199990    values at points\n"
     "  krv doctor scene.tif                   why a file does or does not open\n"
     "`krv VERB --help` explains a verb. Exit code: 0 done; 2 the command line is wrong, by itself or\n"
-    "for this file; 1 it failed: a file, the disk, memory, an interrupt.\n"
+    "for this file; 1 it failed: a file, the disk, memory; 130 interrupted.\n"
     "Formats are found below the folder that KRVHOME names, else beside the library.";
 
 constexpr unsigned int MOST_THREADS = 1024;
@@ -74,6 +81,68 @@ void RefuseEmptyValues(CLI::App& oApp)
     }
 }
 
+// The first word that is neither an option nor the value of one; empty when there is none.
+std::string FindVerb(int nArguments, char** pArguments)
+{
+    for (int i = 1; i < nArguments; ++i)
+    {
+        const std::string word = pArguments[i];
+        if (!word.starts_with('-'))
+            return word;
+        i += word == "--threads" ? 1 : 0;
+    }
+    return {};
+}
+
+std::vector<std::string> ListVerbs(const CLI::App& oApp)
+{
+    std::vector<std::string> oNames;
+    for (const CLI::App* const poVerb : oApp.get_subcommands({}))
+        if (!poVerb->get_group().empty())
+            oNames.push_back(poVerb->get_name());
+    return oNames;
+}
+
+// An unknown verb is told by itself: what follows it means nothing.
+bool RefuseVerb(const CLI::App& oApp, const std::string& verb)
+{
+    const auto oKnown = oApp.get_subcommands([&](const CLI::App* poVerb) { return poVerb->check_name(verb); });
+    if (verb.empty() || !oKnown.empty())
+        return false;
+    const std::vector<std::string> oVerbs = ListVerbs(oApp);
+    const std::string nearest = FindNearestWord(verb, oVerbs);
+    std::string all;
+    for (const std::string& name : oVerbs)
+        all += (all.empty() ? "" : ", ") + name;
+    std::fprintf(stderr, "krv: there is no verb \"%s\"; %s\n", OneLine(verb).c_str(),
+                 (nearest.empty() ? "there are " + all : "is " + nearest + " meant?").c_str());
+    return true;
+}
+
+// What the parser says of the command line, as a sentence for its user.
+std::string DescribeMistake(const CLI::App* poApp, const CLI::Error& oError)
+{
+    std::string text = oError.what();
+    const auto oUsed = poApp->get_subcommands();
+    const CLI::App& oVerb = oUsed.empty() ? *poApp : *oUsed.front();
+    const std::size_t nTwice = text.find(": At Most 1 required but received");
+    const std::size_t nUnknown = text.rfind(" --");
+    if (nTwice != std::string::npos)
+        text.replace(nTwice, std::string::npos, " is given more than once");
+    else if (dynamic_cast<const CLI::ExtrasError*>(&oError) != nullptr && nUnknown != std::string::npos)
+    {
+        std::vector<std::string> oNames;
+        for (const CLI::App* const poOne : {&oVerb, poApp})
+            for (const CLI::Option* const poOption : poOne->get_options())
+                for (const std::string& name : poOption->get_lnames())
+                    oNames.push_back("--" + name);
+        const std::string word = text.substr(nUnknown + 1);
+        const std::string nearest = FindNearestWord(word.substr(0, word.find('=')), oNames);
+        text = "there is no option " + word + (nearest.empty() ? "" : "; is " + nearest + " meant?");
+    }
+    return "krv: " + OneLine(text) + "; `krv " + (oUsed.empty() ? "" : oVerb.get_name() + " ") + "--help` explains\n";
+}
+
 int RunVerb(const Selection& oSelection, bool bVerbose)
 {
     try
@@ -86,6 +155,12 @@ int RunVerb(const Selection& oSelection, bool bVerbose)
     {
         std::fprintf(stderr, "krv: %s\n", OneLine(oError.what()).c_str());
         return 2;
+    }
+    catch (const operations::StoppedException&)
+    {
+        TellWarnings("");
+        std::fprintf(stderr, "krv: interrupted; files are as they were\n");
+        return INTERRUPTED;
     }
     catch (...)
     {
@@ -100,22 +175,16 @@ int RunVerb(const Selection& oSelection, bool bVerbose)
 int RunApplication(int nArguments, char** pArguments)
 {
     CLI::App oApp("Reads and writes raster files of every format that has a plug-in.", "krv");
+    oApp.formatter(std::make_shared<HelpFormatter>());
+    oApp.set_help_flag("-h,--help", "Say this");
     Selection oSelection;
     bool bVerbose = false;
     unsigned int nThreads = 0;
-    oApp.set_version_flag("--version", "krv " KRV_VERSION);
+    oApp.set_version_flag("--version", "krv " KRV_VERSION, "Say which version this is");
     oApp.add_flag("--verbose", bVerbose, "Errors also name the function, source file and line");
     oApp.add_option("--threads", nThreads, "How many threads work at one time; one for each processor by default")
         ->check(CLI::Range(1U, MOST_THREADS));
-    oApp.failure_message(
-        [](const CLI::App*, const CLI::Error& oError)
-        {
-            std::string text = oError.what();
-            const std::size_t nTwice = text.find(": At Most 1 required but received");
-            if (nTwice != std::string::npos)
-                text.replace(nTwice, std::string::npos, " is given more than once");
-            return "krv: " + OneLine(text) + "; `krv --help` explains\n";
-        });
+    oApp.failure_message(&DescribeMistake);
     oApp.require_subcommand(1);
     oApp.fallthrough();
     AddFormatsVerb(oApp, oSelection);
@@ -129,9 +198,14 @@ int RunApplication(int nArguments, char** pArguments)
     AddOverviewsVerb(oApp, oSelection);
     AddMaskVerb(oApp, oSelection);
     AddWarpVerb(oApp, oSelection);
+    AddEditVerb(oApp, oSelection);
+    AddSampleVerb(oApp, oSelection);
     AddDoctorVerb(oApp, oSelection);
+    AddDescribeVerb(oApp, oSelection);
     RefuseEmptyValues(oApp);
     oApp.footer(FOOTER); // after the verbs, which would take it over
+    if (RefuseVerb(oApp, FindVerb(nArguments, pArguments)))
+        return 2;
     try
     {
         oApp.parse(nArguments, pArguments);

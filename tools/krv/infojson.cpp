@@ -98,6 +98,37 @@ Json ToJson(const krv::datasources::Sidecar& oSidecar)
             {"trouble", TextOrNull(oSidecar.moTrouble)}};
 }
 
+// The file's own block; the preferred tile where the format does not tell.
+Json StorageToJson(const FileInfo& oInfo)
+{
+    const auto& oStorage = oInfo.storage;
+    Json oJson{{"variant", TextOrNull(oInfo.variant)}, {"bytes", OrNull(oInfo.fileBytes)}};
+    oJson["layout"] = oStorage ? Json(oStorage->tiled ? "tiles" : "strips") : Json();
+    oJson["compression"] = oStorage ? TextOrNull(oStorage->compression) : Json();
+    oJson["lossy"] = oStorage ? Json(oStorage->lossy) : Json();
+    oJson["predictor"] = oStorage ? Json(oStorage->predictor) : Json();
+    oJson["interleave"] = oStorage ? Json(oStorage->separate ? "band" : "pixel") : Json();
+    oJson["byteOrder"] = oStorage ? Json(oStorage->bigEndian ? "big" : "little") : Json();
+    return oJson;
+}
+
+// West, south, east, north.
+template <typename Bounds>
+Json BoundsToJson(const std::optional<Bounds>& oBounds)
+{
+    return oBounds ? Json::array({oBounds->west, oBounds->south, oBounds->east, oBounds->north}) : Json();
+}
+
+Json PixelSizeToJson(const std::optional<PixelSize>& oSize)
+{
+    return oSize ? Json{{"x", oSize->x}, {"y", oSize->y}, {"unit", TextOrNull(oSize->unit)}} : Json();
+}
+
+Json CloudToJson(const std::optional<std::vector<std::string>>& oReasons)
+{
+    return oReasons ? Json{{"valid", oReasons->empty()}, {"reasons", *oReasons}} : Json();
+}
+
 template <typename Facts>
 Json ListToJson(const std::vector<Facts>& oFacts)
 {
@@ -107,7 +138,23 @@ Json ListToJson(const std::vector<Facts>& oFacts)
     return oList;
 }
 
+// 2: blocks are the file's own, with what was not there before.
+constexpr int INFO_VERSION = 2;
+
 } // namespace
+
+const char* PlacedByText(PlacedBy eKind)
+{
+    switch (eKind)
+    {
+    case PlacedBy::eModel:
+        return "sensor model";
+    case PlacedBy::ePoints:
+        return "control points";
+    default:
+        return "transform";
+    }
+}
 
 Json InfoToJson(const FileInfo& oInfo)
 {
@@ -119,8 +166,8 @@ Json InfoToJson(const FileInfo& oInfo)
             {"format", OrNull(oInfo.format)},
             {"width", oInfo.width},
             {"height", oInfo.height},
-            {"blockWidth", oInfo.blockWidth},
-            {"blockHeight", oInfo.blockHeight},
+            {"blockWidth", oInfo.storage ? oInfo.storage->blockWidth : oInfo.tileWidth},
+            {"blockHeight", oInfo.storage ? oInfo.storage->blockHeight : oInfo.tileHeight},
             {"channels", oChannels},
             {"metadata", MapToJson(oInfo.metadata)},
             {"geocoding", OrNull(oInfo.geocoding)},
@@ -138,7 +185,15 @@ Json InfoToJson(const FileInfo& oInfo)
             {"furtherImages", OrNull(oInfo.furtherImages)},
             {"sidecars", ListToJson(oInfo.sidecars)},
             {"models", ListToJson(oInfo.mathModels)},
-            {"linkedFiles", oInfo.linkedFiles}};
+            {"linkedFiles", oInfo.linkedFiles},
+            {"version", INFO_VERSION},
+            {"preferredTile", {{"width", oInfo.tileWidth}, {"height", oInfo.tileHeight}}},
+            {"storage", StorageToJson(oInfo)},
+            {"placedBy", oInfo.placedBy ? Json(PlacedByText(*oInfo.placedBy)) : Json()},
+            {"bounds", BoundsToJson(oInfo.bounds)},
+            {"boundsLonLat", BoundsToJson(oInfo.geographic)},
+            {"pixelSize", PixelSizeToJson(oInfo.pixelSize)},
+            {"cloudLayout", CloudToJson(oInfo.cloudReasons)}};
 }
 
 } // namespace krv::tool

@@ -1,6 +1,7 @@
 #include "tools/krv/infotext.h"
 
 #include "tools/krv/errors.h"
+#include "tools/krv/progress.h"
 
 #include <fmt/format.h>
 
@@ -51,10 +52,59 @@ std::string GeocodingText(const Json& oTerms)
         return oTerms[static_cast<std::size_t>(i)].get<double>();
     };
     if (Term(2) == 0 && Term(4) == 0)
-        return Line("origin", fmt::format("{}, {}", Term(0), Term(3))) +
-               Line("pixel", fmt::format("{} x {}", Term(1), Term(5)));
+        return Line("origin", fmt::format("{}, {}", Term(0), Term(3)));
     return Line("geocoding", fmt::format("x = {} + {} column + {} row", Term(0), Term(1), Term(2))) +
            Line("", fmt::format("y = {} + {} column + {} row", Term(3), Term(4), Term(5)));
+}
+
+// "tiles of 256 x 256, DEFLATE, predictor 2, channels together"
+std::string StorageText(const Json& oInfo)
+{
+    const Json& oStorage = oInfo["storage"];
+    const std::string size = Text(oInfo["blockWidth"]) + " x " + Text(oInfo["blockHeight"]);
+    std::string text = oStorage["layout"].is_null() ? Line("block", size) : std::string();
+    if (text.empty())
+    {
+        std::string how = Text(oStorage["layout"]) + " of " + size + ", ";
+        how += oStorage["compression"] == "NONE" ? "not compressed" : Text(oStorage["compression"]);
+        if (oStorage["lossy"] == true)
+            how += " (lossy)";
+        if (oStorage["predictor"] != 1)
+            how += ", predictor " + Text(oStorage["predictor"]);
+        if (oInfo["channels"].size() > 1)
+            how += oStorage["interleave"] == "band" ? ", each channel by itself" : ", channels together";
+        text = Line("stored in", how);
+    }
+    if (oStorage["bytes"].is_number())
+        text += Line("on disk", (oStorage["variant"].is_null() ? "" : Text(oStorage["variant"]) + ", ") +
+                                    BytesText(oStorage["bytes"].get<double>()));
+    if (oInfo["cloudLayout"].is_null())
+        return text;
+    return text + Line("cloud", oInfo["cloudLayout"]["valid"] == true
+                                    ? "laid out for reading over a network (COG)"
+                                    : "not laid out for reading over a network (krv doctor --cog tells why)");
+}
+
+std::string PlaceText(const Json& oInfo)
+{
+    std::string text;
+    const Json &oSize = oInfo["pixelSize"], &oBounds = oInfo["bounds"], &oDegrees = oInfo["boundsLonLat"];
+    const auto Number = [](const Json& oNumber)
+    {
+        return oNumber.get<double>();
+    };
+    if (!oSize.is_null())
+        text += Line("pixel", fmt::format("{} x {}{}", Number(oSize["x"]), Number(oSize["y"]),
+                                          oSize["unit"].is_null() ? "" : " " + Text(oSize["unit"])));
+    if (!oBounds.is_null())
+        text += Line("extent", fmt::format("{}, {} to {}, {}", Number(oBounds[0]), Number(oBounds[1]),
+                                           Number(oBounds[2]), Number(oBounds[3])));
+    if (!oDegrees.is_null())
+        text +=
+            Line("lon, lat", fmt::format("{:.6f}, {:.6f} to {:.6f}, {:.6f}{}", Number(oDegrees[0]), Number(oDegrees[1]),
+                                         Number(oDegrees[2]), Number(oDegrees[3]),
+                                         oInfo["placedBy"] == "transform" ? "" : " by its " + Text(oInfo["placedBy"])));
+    return text;
 }
 
 std::string CrsText(const Json& oCrs)
@@ -134,9 +184,10 @@ std::string InfoText(const Json& oInfo)
         text += Line("pixels in", Text(oFile));
     text += Line("size", fmt::format("{} x {} pixels, {} channel{}", Text(oInfo["width"]), Text(oInfo["height"]),
                                      oInfo["channels"].size(), oInfo["channels"].size() == 1 ? "" : "s"));
-    text += Line("block", fmt::format("{} x {}", Text(oInfo["blockWidth"]), Text(oInfo["blockHeight"])));
+    text += StorageText(oInfo);
     text += oInfo["crs"].is_null() ? Line("crs", "-") : CrsText(oInfo["crs"]);
     text += oInfo["geocoding"].is_null() ? Line("geocoding", "-") : GeocodingText(oInfo["geocoding"]);
+    text += PlaceText(oInfo);
     text += OverviewsText(oInfo["overviews"]);
     for (const Json& oBitmap : oInfo["bitmaps"])
         text += Line("bitmap",

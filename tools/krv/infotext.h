@@ -6,6 +6,9 @@
 namespace krv::tool
 {
 
+// "transform", "sensor model", "control points"
+const char* PlacedByText(operations::PlacedBy eKind);
+
 // With the field names that `krv info --json` promises. Absent facts are null, absent lists empty. A channel's no-data
 // value is text.
 Json InfoToJson(const operations::FileInfo& oInfo);

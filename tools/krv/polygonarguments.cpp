@@ -168,6 +168,10 @@ std::string ReadText(const std::string& name)
     if (!why.empty() || !oStream)
         throw UsageError(why.empty() ? "it cannot be read" : why);
     std::string text((std::istreambuf_iterator<char>(oStream)), std::istreambuf_iterator<char>());
+    if (text.starts_with(std::string("\0\0\x27\x0A", 4)))
+        throw UsageError("it is a shapefile, which is not read; give GeoJSON or WKT");
+    if (text.starts_with("SQLite format 3"))
+        throw UsageError("it is a database such as a GeoPackage, which is not read; give GeoJSON or WKT");
     return text.starts_with("\xEF\xBB\xBF") ? text.substr(3) : text;
 }
 

@@ -23,11 +23,12 @@ using krv::gobs::ExactMaskDecision;
 using krv::gobs::IMaskBuilder;
 using krv::gobs::Mask;
 
-std::unique_ptr<ValiditySource> MakeSource(IRasterWriter& oWriter)
+std::unique_ptr<ValiditySource> MakeSource(IRasterWriter& oWriter, bool bNoData)
 {
     const auto* const poAccess = dynamic_cast<const IDatasetAccess*>(&oWriter);
     if (poAccess != nullptr && poAccess->GetDataset() != nullptr)
-        return std::make_unique<ValiditySource>(poAccess->GetDataset(), poAccess->GetChannels());
+        return std::make_unique<ValiditySource>(poAccess->GetDataset(), poAccess->GetChannels(),
+                                                krv::gobs::eAllChannels, bNoData);
     krv::nspio::Warning::Warn("Overviews: the writer does not show its dataset, so that a validity mask and an alpha "
                               "channel that is not among the written ones take no part");
     return std::make_unique<ValiditySource>(oWriter);
@@ -44,9 +45,9 @@ SampleValidity::SampleValidity(IRasterWriter& oWriter, const OverviewOptions& oO
     : mpoPixels(oOptions.mpoValidity)
 {
     const AuxiliaryData oMetadata = oWriter.GetAuxiliaryData();
-    std::unique_ptr<ValiditySource> oSource = mpoPixels == nullptr ? MakeSource(oWriter) : nullptr;
+    std::unique_ptr<ValiditySource> oSource = mpoPixels == nullptr ? MakeSource(oWriter, !oOptions.moNoData) : nullptr;
     for (unsigned int nChannel = 1; nChannel <= oWriter.GetChansCount(); ++nChannel)
-        moNoData.push_back(GetTypedNoData(oMetadata, nChannel));
+        moNoData.push_back(oOptions.moNoData ? oOptions.moNoData : GetTypedNoData(oMetadata, nChannel));
     if (oSource != nullptr)
     {
         mnBitmap = oSource->GetBitmap();

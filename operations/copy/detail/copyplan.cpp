@@ -36,7 +36,7 @@ bool Holds(const krv::gobs::DataType& oType, const krv::datasources::NoDataValue
 CopyPlan::CopyPlan(const CopyRequest& oRequest)
 {
     for (const std::string& name : oRequest.sources)
-        moSources.push_back(std::make_unique<SourceFile>(name));
+        moSources.push_back(std::make_unique<SourceFile>(name, eReadOnly, oRequest.noData));
     CheckSizes();
     ChooseChannels(oRequest.channels);
     ChooseWindow(oRequest.window);

@@ -41,8 +41,7 @@ std::vector<Part> FindParts(const CopyPlan& oPlan)
             if (oChannel.source == nSource)
                 oChannels.push_back(oChannel.channel);
         for (const ChannelGroup& oGroup : oSource.GroupByType(oChannels))
-            oParts.push_back({oSource.Read(oGroup.channels),
-                              std::make_unique<ValiditySource>(&oSource.GetDataset(), oGroup.channels)});
+            oParts.push_back({oSource.Read(oGroup.channels), oSource.MakeValidity(oGroup.channels)});
     }
     return oParts;
 }

@@ -30,7 +30,9 @@ struct StoredChannels
 {
     // A reader with all that it stands on but the file, which outlives it. Called by any thread, each time with the
     // file opened once more; the readers are alike.
-    std::function<std::shared_ptr<krv::datasources::IRasterReader>(const SourceFile& oFile)> open;
+    using Open = std::function<std::shared_ptr<krv::datasources::IRasterReader>(const SourceFile& oFile)>;
+
+    Open open;
     std::vector<unsigned int> channels; // of the new file, in the order of the reader's
 };
 

@@ -4,9 +4,9 @@
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "operations/job/exceptions.h"
+#include "operations/source/referencesystem.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
-#include "toolkit/ogc/cs/crsfactory.h"
 
 #include <fmt/format.h>
 
@@ -88,7 +88,7 @@ PolygonPlacer::PolygonPlacer(const SourceFile& oFile, const MaskRequest& oReques
     if (poTarget == nullptr)
         throw krv::DataException(oFile.GetName() + ": the file names no reference system; give polygons in its own "
                                                    "map units, with --coordinates map");
-    const auto poSource = krv::ogc::cs::CreateCRSFromWKT(crs);
+    const auto poSource = ParseReferenceSystem(crs);
     moTransformation.emplace(*poSource, *poTarget);
     mnSourceTurn = TurnOf(*poSource);
     mnTargetTurn = TurnOf(*poTarget);

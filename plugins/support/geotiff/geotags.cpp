@@ -172,6 +172,15 @@ void SetTiePoints(GeoTags& oTags, const std::vector<TiePoint>& oPoints)
                                  {oPoint.column - nShift, oPoint.row - nShift, 0.0, oPoint.x, oPoint.y, oPoint.z});
 }
 
+void RemoveCRS(GeoTags& oTags)
+{
+    const bool bPoint = IsPixelPoint(oTags);
+    GeoKeyList oKeys;
+    if (bPoint) // where the centres of pixels are placed they stay so
+        oKeys.Set(GTRasterTypeGeoKey, static_cast<std::uint16_t>(RasterPixelIsPoint));
+    oKeys.Store(oTags);
+}
+
 void SetCRS(GeoTags& oTags, const krv::ogc::cs::ICRS& oCRS, const std::string& fileName, const krv::Place& oPlace)
 {
     const std::uint16_t nRasterType = GeoKeyList::From(oTags).GetCode(GTRasterTypeGeoKey, RasterPixelIsArea);

@@ -76,5 +76,7 @@ void SetTiePoints(GeoTags& oTags, const std::vector<TiePoint>& oPoints);
 // By its code, else by its parts, else as a text: the first of these that reads back as the same system. Throws
 // DataException that names the file when none does, and changes nothing.
 void SetCRS(GeoTags& oTags, const krv::ogc::cs::ICRS& oCRS, const std::string& fileName, const krv::Place& oPlace);
+// The geocoding stays as it is.
+void RemoveCRS(GeoTags& oTags);
 
 } // namespace krv::plugins::support

@@ -159,6 +159,16 @@ krv::ogc::cs::GeocodingInfo RecordText::GetGeocoding() const
     return oText && oInfo.IsInvertible() ? oInfo : krv::ogc::cs::GeocodingInfo();
 }
 
+void RecordText::RemoveCRS()
+{
+    moOwn.erase(CRS);
+}
+
+void RecordText::RemoveGeocoding()
+{
+    moOwn.erase(GEOCODING);
+}
+
 void RecordText::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
 {
     std::string& text = moOwn[GEOCODING];

@@ -42,6 +42,8 @@ public:
     // The identity when there is none.
     krv::ogc::cs::GeocodingInfo GetGeocoding() const;
     void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo);
+    void RemoveCRS();
+    void RemoveGeocoding();
 
 private:
     void ReadOwn(const std::string& name, const std::string& value);

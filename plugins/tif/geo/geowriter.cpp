@@ -100,4 +100,11 @@ void GeoWriter::SetCRS(const krv::ogc::cs::ICRS& oCRS, const Place& oPlace)
     StoreKeys(oTags);
 }
 
+void GeoWriter::RemoveCRS()
+{
+    support::GeoTags oTags = GetTags();
+    support::RemoveCRS(oTags);
+    StoreKeys(oTags);
+}
+
 } // namespace krv::plugins::tif

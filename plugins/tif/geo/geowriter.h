@@ -23,6 +23,7 @@ public:
     void RemoveRasterType();
     void SetTiePoints(const std::vector<TiePoint>& oPoints);
     void SetCRS(const krv::ogc::cs::ICRS& oCRS, const Place& oPlace);
+    void RemoveCRS();
 
 private:
     support::GeoTags GetTags() const;

@@ -1,5 +1,6 @@
 // FileEditor: how changes become the file's.
 #include "plugins/support/file/copypieces.h"
+#include "plugins/tif/reading/cloudheader.h"
 #include "plugins/tif/writing/directorybytes.h"
 #include "plugins/tif/writing/fileeditor.h"
 #include "plugins/tif/writing/pagewriter.h"
@@ -33,6 +34,14 @@ std::uint64_t GetPixels(const PageModel& oPage)
     return oPage.moTags.GetNumber(TIFFTAG_IMAGEWIDTH, 0) * oPage.moTags.GetNumber(TIFFTAG_IMAGELENGTH, 0);
 }
 
+bool HasShortBlocks(const std::shared_ptr<PageModel>& poPage)
+{
+    for (std::size_t nAt = 0; nAt < poPage->GetStriles(); ++nAt)
+        if (poPage->moByteCounts[nAt] > UINT32_MAX)
+            return false;
+    return true;
+}
+
 std::vector<Placed> ToPlace(const std::vector<std::shared_ptr<PageModel>>& oPages)
 {
     std::vector<Placed> oPlaced;
@@ -63,20 +72,39 @@ void PlaceDirectory(Placed& oPlaced, const FileHeader& oHeader, std::uint64_t nB
     oPlaced.moCountArray = oSpace.Allocate(oPage.GetStriles() * nWord);
 }
 
-void CopyBlocks(Placed& oPlaced, const support::File& oSource, support::Space& oSpace, support::File& oTarget,
-                support::Scratch& oScratch)
+// Writes in front of a block how long it is, and behind it its last bytes once more: clients that read it with its
+// neighbours see so where it ends, and whether they have all of it.
+void Enclose(const support::CopiedPiece& oBlock, support::File& oTarget)
 {
+    std::vector<unsigned char> oLeader;
+    support::AppendNumber(oLeader, oBlock.mnBytes, CloudHeader::LEADER_BYTES, false);
+    oTarget.Write(oBlock.mnTo - oLeader.size(), oLeader.data(), oLeader.size());
+    unsigned char aTrailer[CloudHeader::TRAILER_BYTES] = {};
+    const auto nLast = std::min<std::uint64_t>(oBlock.mnBytes, sizeof(aTrailer));
+    const std::uint64_t nEnd = oBlock.mnTo + oBlock.mnBytes;
+    oTarget.Read(nEnd - nLast, aTrailer + sizeof(aTrailer) - nLast, nLast);
+    oTarget.Write(nEnd, aTrailer, sizeof(aTrailer));
+}
+
+void CopyBlocks(Placed& oPlaced, const support::File& oSource, support::Space& oSpace, support::File& oTarget,
+                bool bEnclosed, support::Scratch& oScratch)
+{
+    const std::uint64_t nBefore = bEnclosed ? CloudHeader::LEADER_BYTES : 0;
+    const std::uint64_t nAround = bEnclosed ? nBefore + CloudHeader::TRAILER_BYTES : 0;
     PageModel& oPage = oPlaced.moPage;
     std::vector<support::CopiedPiece> oPieces;
     for (std::size_t nAt = 0; nAt < oPage.GetStriles(); ++nAt)
     {
         const std::uint64_t nBytes = oPage.moByteCounts[nAt];
-        oPage.moOffsets[nAt] = nBytes == 0 ? 0 : oSpace.Allocate(nBytes).mnOffset;
+        oPage.moOffsets[nAt] = nBytes == 0 ? 0 : oSpace.Allocate(nBytes + nAround).mnOffset + nBefore;
         if (nBytes != 0)
             oPieces.push_back({oPlaced.mpOld->moOffsets[nAt], oPage.moOffsets[nAt], nBytes});
         if (oPieces.size() < COPIED_PIECES && nAt + 1 < oPage.GetStriles())
             continue;
-        support::CopyPieces(oSource, oTarget, std::move(oPieces), oScratch);
+        support::CopyPieces(oSource, oTarget, oPieces, oScratch);
+        for (const support::CopiedPiece& oPiece : oPieces)
+            if (bEnclosed)
+                Enclose(oPiece, oTarget);
         oPieces.clear();
     }
 }
@@ -99,21 +127,29 @@ void WriteDirectory(const Placed& oPlaced, const FileHeader& oHeader, std::uint6
 
 // Writes a file anew so that it can be read in few requests over a network: the header, all directories with their
 // values, the image first and its levels from large to small, and then the blocks, those of the smallest level first
-// and in each page in their order. Blocks are copied as they are stored. bSorted: otherwise pages stay in their order.
+// and in each page in their order. Blocks are copied as they are stored. bCloud: with the text that tells clients so;
+// otherwise pages stay in their order.
 // oPages: of the chain, their tags in memory; the first is the image.
 void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, const FileHeader& oHeader,
-                      const support::File& oSource, support::File& oTarget, bool bSorted)
+                      const support::File& oSource, support::File& oTarget, bool bCloud)
 {
     std::vector<Placed> oSorted = ToPlace(oPages);
-    if (bSorted)
+    if (bCloud)
         Sort(oSorted);
-    support::Space oSpace(oTarget.GetName(), oHeader.GetBytes(), oHeader.mbBigTiff ? INT64_MAX : UINT32_MAX,
+    // A block that is longer than a leader can say has none, and so have all others.
+    const bool bEnclosed = bCloud && std::all_of(oPages.begin(), oPages.end(), &HasShortBlocks);
+    const bool bRowMajor =
+        std::all_of(oPages.begin(), oPages.end(),
+                    [](const auto& poPage) { return poPage->moTags.GetNumber(TIFFTAG_PLANARCONFIG, 1) == 1; });
+    const std::string text = bEnclosed ? CloudHeader::Make(bRowMajor) : std::string();
+    support::Space oSpace(oTarget.GetName(), oHeader.GetBytes() + text.size(),
+                          oHeader.mbBigTiff ? INT64_MAX : UINT32_MAX,
                           "the file would pass the limit of 4 GiB of classic TIFF");
     for (Placed& oPlaced : oSorted)
         PlaceDirectory(oPlaced, oHeader, &oPlaced == oSorted.data() ? support::RoomRecord::GetBytes(0) : 0, oSpace);
     support::Scratch oScratch;
     for (auto oPlaced = oSorted.rbegin(); oPlaced != oSorted.rend(); ++oPlaced)
-        CopyBlocks(*oPlaced, oSource, oSpace, oTarget, oScratch);
+        CopyBlocks(*oPlaced, oSource, oSpace, oTarget, bEnclosed, oScratch);
     for (std::size_t nAt = 0; nAt < oSorted.size(); ++nAt)
         WriteDirectory(oSorted[nAt], oHeader,
                        nAt + 1 < oSorted.size() ? oSorted[nAt + 1].moPage.moDirectory.mnOffset : 0, oTarget);
@@ -125,6 +161,7 @@ void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, con
     oTarget.Write(nRecord, oRecord.Make(oRoot.mnOffset).data(), oRecord.GetBytes());
     unsigned char aHeader[FileHeader::BYTES] = {};
     oHeader.Write(aHeader, oSorted.front().moPage.moDirectory.mnOffset);
+    oTarget.Write(oHeader.GetBytes(), reinterpret_cast<const unsigned char*>(text.data()), text.size());
     oTarget.Write(0, aHeader, oHeader.GetBytes());
 }
 
@@ -310,6 +347,20 @@ void FileEditor::Commit(const std::vector<Written>& oWritten)
         mpoSpace->Reuse(IsNamed() ? GetFile()->FindHeld() : support::Space::Roots(std::in_place));
 }
 
+// Before the first change becomes the file's, its own text says that what it promised does not hold any more.
+void FileEditor::MarkChanged()
+{
+    if (mnCloudBytes == 0 || mbMarked)
+        return;
+    const std::optional<CloudHeader> oCloud = CloudHeader::Read(*GetFile(), moHeader);
+    if (oCloud && !oCloud->mbChanged)
+    {
+        const std::string marked = CloudHeader::MarkChanged(oCloud->moText);
+        GetFile()->Write(moHeader.GetBytes(), reinterpret_cast<const unsigned char*>(marked.data()), marked.size());
+    }
+    mbMarked = true;
+}
+
 // What was written reaches the disk before the one number that makes it the file's, and that before anything of the
 // former state is given up. A new file is nobody's until it has its name: all of it reaches the disk at once.
 void FileEditor::Publish(const std::vector<Written>& oWritten)
@@ -319,6 +370,7 @@ void FileEditor::Publish(const std::vector<Written>& oWritten)
     const bool bNew = !IsNamed();
     try
     {
+        MarkChanged();
         if (!bNew)
             GetFile()->Flush();
     }

@@ -133,6 +133,7 @@ private:
     std::vector<Written> WriteDirectories();
     void Commit(const std::vector<Written>& oWritten);
     void Publish(const std::vector<Written>& oWritten);
+    void MarkChanged();
     void ReleaseWritten(const std::vector<Written>& oWritten);
     void Adopt(const Written& oWritten);
     // pHeir: the page that takes its place, or null.
@@ -147,6 +148,8 @@ private:
     std::vector<std::weak_ptr<PageWriter>> moWriters;
     std::uint64_t mnNextNumber = 1;
     std::uint64_t mnModelBytes = UINT64_MAX; // that the structure may still take
+    std::uint64_t mnCloudBytes = 0;          // of the text for clients behind the header
+    bool mbMarked = false;                   // it says that the file was changed
     std::uint64_t mnCommittedSize = 0;       // of the file with all that its committed state may use
     std::vector<Extent> moReleased;          // of pages that are gone
     support::Scratch moScratch;              // for bytes on their way

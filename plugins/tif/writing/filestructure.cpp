@@ -1,4 +1,5 @@
 // FileEditor: the structure of an existing file, and which of its bytes are free.
+#include "plugins/tif/reading/cloudheader.h"
 #include "plugins/tif/writing/directorybytes.h"
 #include "plugins/tif/writing/fileeditor.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -54,6 +55,8 @@ FileEditor::FileEditor(std::shared_ptr<support::File> poFile, const std::optiona
     UseSpace(GetFile()->GetSize());
     mpoSpace->Age(moHeader.mnFirstDirectory);
     mnCommittedSize = GetFile()->GetSize();
+    if (const std::optional<CloudHeader> oCloud = CloudHeader::Read(*GetFile(), moHeader))
+        mnCloudBytes = oCloud->moText.size();
     mnModelBytes = MODEL_BYTES + MODEL_BYTES_PER_BYTE * mnCommittedSize;
     ReadPages();
     FindUnused();
@@ -197,7 +200,7 @@ void FileEditor::LoadTags(PageModel& oPage)
 
 std::vector<Extent> FileEditor::ListUsed() const
 {
-    std::vector<Extent> oUsed = {{0, moHeader.GetBytes(), 0}};
+    std::vector<Extent> oUsed = {{0, moHeader.GetBytes() + mnCloudBytes, 0}};
     const auto Add = [&oUsed](const Extent& oPiece)
     {
         if (oPiece.mnBytes != 0)

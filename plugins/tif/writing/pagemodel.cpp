@@ -64,10 +64,12 @@ std::uint16_t ChoosePredictor(const NewImage& oImage, const CreateOptions& oOpti
         return PREDICTOR_NONE;
     const krv::gobs::DataType& oType = oImage.moType;
     const bool bPacked = !oType.IsReal() && ChooseBits(oImage, oOptions, oPlace) != oType.GetValueBits();
+    // Differences of 64-bit integers are refused by other readers: who wants them asks for them.
     if (oOptions.mnPredictor == 0)
-        return bPacked || oType.IsComplex() ? PREDICTOR_NONE
-               : oType.IsReal()             ? PREDICTOR_FLOATINGPOINT
-                                            : PREDICTOR_HORIZONTAL;
+        return bPacked || oType.IsComplex()                 ? PREDICTOR_NONE
+               : oType.IsReal()                             ? PREDICTOR_FLOATINGPOINT
+               : ChooseBits(oImage, oOptions, oPlace) == 64 ? PREDICTOR_NONE
+                                                            : PREDICTOR_HORIZONTAL;
     const bool bFits = oOptions.mnPredictor == PREDICTOR_NONE ||
                        (oOptions.mnPredictor == PREDICTOR_HORIZONTAL && !oType.IsComplex() && !bPacked) ||
                        (oOptions.mnPredictor == PREDICTOR_FLOATINGPOINT && oType.IsReal() && !oType.IsComplex());

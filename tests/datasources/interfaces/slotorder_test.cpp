@@ -10,6 +10,7 @@
 #include "datasources/interfaces/ifileiobuilder.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
+#include "datasources/interfaces/ilayoutdataset.h"
 #include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/ilutdataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
@@ -18,6 +19,7 @@
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/ipageddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/iplaceremoval.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/interfaces/istoragedataset.h"
@@ -126,6 +128,8 @@ std::vector<Table> Tables()
         {"IVerifiedDataset", {Slot(&IVerifiedDataset::Verify)}},
         {"INewFileDataset", {Slot(&INewFileDataset::KeepExisting)}},
         {"IStorageDataset", {Slot(&IStorageDataset::GetUnusedBytes)}},
+        {"ILayoutDataset", {Slot(&ILayoutDataset::GetVariant), Slot(&ILayoutDataset::CheckCloudLayout)}},
+        {"IPlaceRemoval", {Slot(&IPlaceRemoval::RemoveCRS), Slot(&IPlaceRemoval::RemoveGeocoding)}},
         {"IPagedDataset", {Slot(&IPagedDataset::CountFurtherImages)}},
         {"IEncodedBlocks",
          {Slot(&IEncodedBlocks::GetEncodedForm), Slot(&IEncodedBlocks::ReadEncoded),

@@ -24,9 +24,22 @@ struct Options
     std::string channels;
     WindowOptions window;
     std::string type;
+    std::string noData;
+    std::string scale;
+    bool unscale = false;
     bool power = false;
     TargetForm form;
 };
+
+// As other programs call them; numbers of bits of complex types are those of both parts.
+constexpr std::pair<const char*, krv::gobs::NativeDataTypeCode> TYPE_NAMES[] = {
+    {"BYTE", krv::gobs::eDT_8U},        {"UINT8", krv::gobs::eDT_8U},      {"INT8", krv::gobs::eDT_8S},
+    {"UINT16", krv::gobs::eDT_16U},     {"INT16", krv::gobs::eDT_16S},     {"UINT32", krv::gobs::eDT_32U},
+    {"INT32", krv::gobs::eDT_32S},      {"UINT64", krv::gobs::eDT_64U},    {"INT64", krv::gobs::eDT_64S},
+    {"FLOAT32", krv::gobs::eDT_32R},    {"FLOAT64", krv::gobs::eDT_64R},   {"FLOAT", krv::gobs::eDT_32R},
+    {"DOUBLE", krv::gobs::eDT_64R},     {"CINT16", krv::gobs::eDT_C16S},   {"CINT32", krv::gobs::eDT_C32S},
+    {"CFLOAT32", krv::gobs::eDT_C32R},  {"CFLOAT64", krv::gobs::eDT_C64R}, {"COMPLEX64", krv::gobs::eDT_C32R},
+    {"COMPLEX128", krv::gobs::eDT_C64R}};
 
 krv::gobs::DataType ParseType(const std::string& given)
 {
@@ -39,7 +52,11 @@ krv::gobs::DataType ParseType(const std::string& given)
             return oType;
         all += " " + oType.Describe();
     }
-    throw UsageError("--type: \"" + text + "\" is none of promoted" + all);
+    for (const auto& [pName, eCode] : TYPE_NAMES)
+        if (text == pName)
+            return krv::gobs::DataType(eCode);
+    throw UsageError("--type: \"" + given + "\" is none of promoted" + all +
+                     ", nor a name such as uint8, int16, float32 or complex64");
 }
 
 int RunConvert(Options& oOptions)
@@ -50,6 +67,11 @@ int RunConvert(Options& oOptions)
     oRequest.channels = ParseNumbers(oOptions.channels, "--channels");
     oRequest.window = ParseWindow(oOptions.window, "--window");
     oRequest.power = oOptions.power;
+    oRequest.noData = GivenOrNone(oOptions.noData);
+    oRequest.unscale = oOptions.unscale;
+    oRequest.scale = ParseReals(oOptions.scale, "--scale", 2, 4);
+    if (oRequest.scale.size() == 3)
+        throw UsageError("--scale: \"" + oOptions.scale + "\" has 3 numbers, not 2 or 4");
     oRequest.promote = oOptions.type == "promoted";
     if (!oOptions.type.empty() && !oRequest.promote)
         oRequest.type = ParseType(oOptions.type);
@@ -68,11 +90,21 @@ void AddConvertVerb(CLI::App& oApp, Selection& oSelection)
         ->required()
         ->expected(2, std::numeric_limits<int>::max());
     poVerb->add_option("--channels", poOptions->channels,
-                       "Only these, in this order, such as 3,1; counted through all files");
+                       "Only these, in this order, such as 3,1 or 1-3; counted through all files");
     AddWindowOptions(*poVerb, poOptions->window, "--window", "Only this part");
     poVerb->add_flag("--power", poOptions->power, "The power of a radar scene in place of its channels");
     poVerb->add_option("--type", poOptions->type,
-                       "Values of this type, such as 16S, or of the smallest that holds all: promoted");
+                       "Values of this type, such as 16S or int16, or of the smallest that holds all: promoted");
+    auto* const poUnscale = poVerb->add_flag("--unscale", poOptions->unscale,
+                                             "What the values stand for: multiplied by the recorded scale, with the "
+                                             "offset added; as 32R unless --type says");
+    poVerb
+        ->add_option("--scale", poOptions->scale,
+                     "Values from low,high spread over the type (over 0 to 1 for reals), or low,high,to,to; what lies "
+                     "beyond is cut off, and scale and offset are recorded")
+        ->excludes(poUnscale);
+    poVerb->add_option("--no-data", poOptions->noData,
+                       "The no-data value, in place of the recorded one; the copy records it");
     poVerb->add_option("--format", poOptions->form.format,
                        "The new file's format (`krv formats`); else by its extension, TIF when it has none");
     poVerb->add_option("--options", poOptions->form.options,

@@ -34,8 +34,12 @@ Json FindingToJson(const Finding& oFinding)
             {"remedy", TextOrNull(oFinding.remedy)}};
 }
 
-int RunDoctor(const std::string& file, bool bJson)
+std::vector<Finding> Find(const std::string& file, bool bCog)
 {
+    if (bCog && file.empty())
+        throw UsageError("doctor: --cog is about a FILE; name it");
+    if (bCog)
+        return CheckCloudLayout(file);
     const InstallationCheck oInstallation;
     std::vector<Finding> oFindings = oInstallation.GetFindings();
     if (!file.empty())
@@ -43,6 +47,12 @@ int RunDoctor(const std::string& file, bool bJson)
         const auto oMore = CheckFile(file, oInstallation.GetPlugins());
         oFindings.insert(oFindings.end(), oMore.begin(), oMore.end());
     }
+    return oFindings;
+}
+
+int RunDoctor(const std::string& file, bool bCog, bool bJson)
+{
+    const std::vector<Finding> oFindings = Find(file, bCog);
     Json oJson = Json::array();
     std::string text;
     for (const Finding& oFinding : oFindings)
@@ -61,16 +71,17 @@ void AddDoctorVerb(CLI::App& oApp, Selection& oSelection)
 {
     auto* const poVerb = oApp.add_subcommand(
         "doctor", "Checks the installation and each plug-in; for a FILE also why it does or does not open");
-    const auto poJson = std::make_shared<bool>(false);
+    const auto poJson = std::make_shared<bool>(false), poCog = std::make_shared<bool>(false);
     poVerb->add_option("FILE", oSelection.file, "A file that should open");
+    poVerb->add_flag("--cog", *poCog, "Whether FILE is laid out for reading over a network (COG), and if not, why");
     poVerb->add_flag("--json", *poJson, "As JSON");
     poVerb->footer("Exit code 1 when anything is wrong.");
     poVerb->callback(
-        [&oSelection, poJson]
+        [&oSelection, poCog, poJson]
         {
-            oSelection.run = [&oSelection, poJson]
+            oSelection.run = [&oSelection, poCog, poJson]
             {
-                return RunDoctor(oSelection.file, *poJson);
+                return RunDoctor(oSelection.file, *poCog, *poJson);
             };
         });
 }

@@ -3,6 +3,8 @@
 #include "datasources/interfaces/iformatoptions.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/iomanager/formatcapabilities.h"
+#include "operations/home/formathome.h"
+#include "toolkit/core/lettercase.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/verbs/verbs.h"
@@ -12,6 +14,7 @@
 
 #include <algorithm>
 #include <array>
+#include <filesystem>
 #include <memory>
 #include <string>
 #include <vector>
@@ -20,6 +23,7 @@ namespace krv::tool
 {
 
 using namespace krv::datasources;
+using namespace krv::operations;
 
 namespace
 {
@@ -88,20 +92,53 @@ std::string OptionsText(const Json& oFormat)
                         : fmt::format("\nOptions of a new {}\n{}", OneLine(oFormat["name"].get<std::string>()), text);
 }
 
-int RunFormats(bool bJson)
+struct Options
+{
+    std::string name;
+    HomeRequest home;
+    bool json = false;
+};
+
+int ListFormats(const std::string& name, bool bJson)
 {
     const DatasetManager& oManager = *DatasetManager::GetInstance();
     Json oJson{{"home", GetFormatHome()}, {"formats", Json::array()}};
     std::string options;
+    std::vector<std::string> oNames;
     std::vector<Row> oRows{{"NAME", "DESCRIPTION", "EXTENSIONS", "CAN"}};
     for (const IFileFormat* const poFormat : oManager.GetFormatList())
     {
+        oNames.push_back(poFormat->GetShortName());
+        if (!name.empty() && krv::ToUpper(name) != krv::ToUpper(oNames.back()))
+            continue;
         oJson["formats"].push_back(FormatToJson(oManager, *poFormat));
         oRows.push_back(FormatRow(oJson["formats"].back()));
         options += OptionsText(oJson["formats"].back());
     }
-    Print(bJson ? ToText(oJson) : TableText(oRows) + options);
+    if (oJson["formats"].empty())
+        throw UsageError(
+            fmt::format("formats: there is no format \"{}\"; there are {}", name, fmt::join(oNames, ", ")));
+    const std::string hint =
+        name.empty() ? "\n`krv formats NAME` tells what a new file of a format may be told.\n" : "";
+    Print(bJson ? ToText(oJson) : TableText(oRows) + (name.empty() ? hint : options));
     return 0;
+}
+
+int MakeHome(const HomeRequest& oHome, bool bJson)
+{
+    const HomeResult oResult = MakeFormatHome(oHome);
+    Print(bJson ? ToText({{"home", oHome.folder}, {"formats", oResult.formats}, {"added", oResult.added}})
+                : fmt::format("{}: a home with {}\nuse it by KRVHOME={}\n", oHome.folder,
+                              fmt::join(oResult.formats, ", "), std::filesystem::absolute(oHome.folder).string()));
+    return 0;
+}
+
+int RunFormats(const Options& oOptions)
+{
+    if (!oOptions.home.folder.empty() && !oOptions.name.empty())
+        throw UsageError("formats: a NAME and --home do not go together");
+    return oOptions.home.folder.empty() ? ListFormats(oOptions.name, oOptions.json)
+                                        : MakeHome(oOptions.home, oOptions.json);
 }
 
 } // namespace
@@ -110,14 +147,24 @@ void AddFormatsVerb(CLI::App& oApp, Selection& oSelection)
 {
     auto* const poVerb =
         oApp.add_subcommand("formats", "Lists the formats: name, extensions, what each can do, options of new files");
-    const auto poJson = std::make_shared<bool>(false);
-    poVerb->add_flag("--json", *poJson, "As JSON");
+    const auto poOptions = std::make_shared<Options>();
+    poVerb->add_option("NAME", poOptions->name, "One format, with the options of its new files");
+    auto* const poHome = poVerb->add_option(
+        "--home", poOptions->home.folder,
+        "Make this folder a home of one's own, with the installed formats; set KRVHOME to it to use it");
+    poVerb
+        ->add_option("--add", poOptions->home.plugins,
+                     "Add this plug-in (.so, with its description .xml beside it) to that home; may be repeated")
+        ->expected(1)
+        ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll)
+        ->needs(poHome);
+    poVerb->add_flag("--json", poOptions->json, "As JSON");
     poVerb->callback(
-        [&oSelection, poJson]
+        [&oSelection, poOptions]
         {
-            oSelection.run = [poJson]
+            oSelection.run = [poOptions]
             {
-                return RunFormats(*poJson);
+                return RunFormats(*poOptions);
             };
         });
 }

@@ -15,11 +15,18 @@ using namespace krv::operations;
 namespace
 {
 
-int RunInfo(const std::string& file, bool bJson)
+int RunInfo(Selection& oSelection, const std::vector<std::string>& oNames, bool bJson)
 {
-    const SourceFile oFile(file);
-    const Json oInfo = InfoToJson(GatherInfo(oFile));
-    Print(bJson ? ToText(oInfo) : InfoText(oInfo));
+    Json oFiles = Json::array();
+    std::string text;
+    for (const std::string& file : oNames)
+    {
+        oSelection.file = file;
+        const SourceFile oFile(file);
+        oFiles.push_back(InfoToJson(GatherInfo(oFile)));
+        text += InfoText(oFiles.back());
+    }
+    Print(!bJson ? text : oFiles.size() == 1 ? ToText(oFiles.front()) : ToText({{"files", oFiles}}));
     return 0;
 }
 
@@ -30,14 +37,16 @@ void AddInfoVerb(CLI::App& oApp, Selection& oSelection)
     auto* const poVerb = oApp.add_subcommand(
         "info", "Shows everything known of a file: size, types, metadata, reference system, overviews, masks");
     const auto poJson = std::make_shared<bool>(false);
-    poVerb->add_option("FILE", oSelection.file, "The file")->required();
+    const auto poFiles = std::make_shared<std::vector<std::string>>();
+    poVerb->add_option("FILES", *poFiles, "The files")->required();
     poVerb->add_flag("--json", *poJson, "As JSON; absent facts are null, no-data values are text");
     poVerb->callback(
-        [&oSelection, poJson]
+        [&oSelection, poFiles, poJson]
         {
-            oSelection.run = [&oSelection, poJson]
+            oSelection.file = poFiles->front();
+            oSelection.run = [&oSelection, poFiles, poJson]
             {
-                return RunInfo(oSelection.file, *poJson);
+                return RunInfo(oSelection, *poFiles, *poJson);
             };
         });
 }

@@ -23,6 +23,8 @@ using namespace krv::operations;
 namespace
 {
 
+constexpr char RECORDED[] = "true"; // what the parser says for a flag without a value
+
 struct Options
 {
     MaskRequest request;
@@ -32,6 +34,7 @@ struct Options
     std::string channels;
     std::string rule;
     std::string write;
+    std::string noData; // what --no-data is given, RECORDED without a value
     bool validity = false;
     bool zone = false;
     bool json = false;
@@ -52,6 +55,7 @@ unsigned int ParseTarget(const std::string& text)
 void Settle(Options& oOptions)
 {
     MaskRequest& oRequest = oOptions.request;
+    oRequest.noData = !oOptions.noData.empty();
     oRequest.bitmaps = ParseNumbers(oOptions.bitmaps, "--bitmap");
     oRequest.channels = ParseNumbers(oOptions.channels, "--channels");
     oRequest.rule = oOptions.rule == "all" ? krv::gobs::eAllChannels : krv::gobs::eAnyChannel;
@@ -82,7 +86,8 @@ void Settle(Options& oOptions)
 
 MaskResult Make(const std::string& file, Options& oOptions)
 {
-    const SourceFile oFile(file, oOptions.request.IsWriting() ? eUpdate : eReadOnly);
+    const SourceFile oFile(file, oOptions.request.IsWriting() ? eUpdate : eReadOnly,
+                           oOptions.noData == RECORDED ? std::nullopt : GivenOrNone(oOptions.noData));
     for (const std::string& text : oOptions.polygons)
         oOptions.request.polygons.push_back(ReadPolygons(text));
     return MakeMask(oFile, oOptions.request, ShowProgress(), GetExecutor());
@@ -135,11 +140,10 @@ void AddMaskVerb(CLI::App& oApp, Selection& oSelection)
                      "Pixels inside: WKT or GeoJSON, the text itself or a file; may be repeated")
         ->expected(1)
         ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
-    poVerb
-        ->add_option("--coordinates", poOptions->coordinates,
-                     "Of the polygons: pixel ((0, 0) is the outer corner of the first) or map (the file's own system, "
-                     "the rule for WKT; GeoJSON is longitude, latitude otherwise)")
-        ->check(CLI::IsMember({"pixel", "map"}));
+    AddWord(*poVerb, "--coordinates", poOptions->coordinates,
+            "Of the polygons: pixel ((0, 0) is the outer corner of the first) or map (the file's own system, the rule "
+            "for WKT; GeoJSON is longitude, latitude otherwise)",
+            {"pixel", "map"});
     poVerb
         ->add_option("--crs", poOptions->request.crs,
                      "Reference system of the polygons, such as EPSG:4326, in which their edges are straight; x is "
@@ -147,11 +151,11 @@ void AddMaskVerb(CLI::App& oApp, Selection& oSelection)
         ->check([](const std::string& text)
                 { return text.empty() ? std::string("the empty text is no known reference system") : std::string(); });
     poVerb->add_option("--bitmap", poOptions->bitmaps, "Pixels set in one of these bitmaps, such as 1,3");
-    poVerb->add_flag("--no-data", poOptions->request.noData, "Pixels that equal the recorded no-data values");
-    poVerb
-        ->add_option("--rule", poOptions->rule,
-                     "Whether any of the channels with a no-data value (the default) or all of them must equal theirs")
-        ->check(CLI::IsMember({"any", "all"}));
+    poVerb->add_flag("--no-data", poOptions->noData,
+                     "Pixels that equal the recorded no-data values, or with --no-data=-9999 that one");
+    AddWord(*poVerb, "--rule", poOptions->rule,
+            "Whether any of the channels with a no-data value (the default) or all of them must equal theirs",
+            {"any", "all"});
     poVerb->add_option("--channels", poOptions->channels, "No-data of these channels only, such as 1,3");
     poVerb->add_option("--write", poOptions->write,
                        "Store it in this bitmap of the file, or in a new one (the word new)");

@@ -39,6 +39,7 @@ struct Options
 {
     std::string levels;
     std::string resampling;
+    std::string noData;
     WindowOptions changed;
     OverviewOptions building;
 };
@@ -146,7 +147,8 @@ int RunOverviews(const std::string& file, Options& oOptions)
 {
     auto oLevels = ParseLevels(oOptions.levels);
     SetChanged(file, oOptions.changed, oOptions.building);
-    const SourceFile oFile(file);
+    const SourceFile oFile(file, eReadOnly, GivenOrNone(oOptions.noData));
+    oOptions.building.moNoData = krv::datasources::ParseNoData(oOptions.noData);
     const unsigned int nWidth = oFile.GetRaster().GetWidth(), nHeight = oFile.GetRaster().GetHeight();
     const std::vector<ChannelGroup> oGroups = oFile.GroupByType(oFile.CheckChannels({}));
     CheckChanged(file, oOptions.building, nWidth, nHeight);
@@ -184,12 +186,10 @@ void AddOverviewsVerb(CLI::App& oApp, Selection& oSelection)
     poVerb->add_option("FILE", oSelection.file, "The file; it is changed in place")->required();
     poVerb->add_option("--levels", poOptions->levels,
                        "Reduction factors: 2,4,8,16 (powers of two, until a level is below 256 pixels)");
-    poVerb
-        ->add_option("--resampling", poOptions->resampling,
-                     "average (mode for indices of a colour table), nearest, mode, bilinear, cubic, lanczos, rms, min, "
-                     "max")
-        ->check(CLI::IsMember({"average", "nearest", "mode", "bilinear", "cubic", "lanczos", "rms", "min", "max"},
-                              CLI::ignore_case));
+    AddWord(*poVerb, "--resampling", poOptions->resampling,
+            "How pixels are made: average, of indices of a colour table mode, unless said",
+            {"average", "nearest", "mode", "bilinear", "cubic", "lanczos", "rms", "min", "max"});
+    poVerb->add_option("--no-data", poOptions->noData, "The no-data value, in place of the recorded one");
     AddWindowOptions(*poVerb, poOptions->changed, "--changed",
                      "Only this part of the image changed since its levels were built");
     poVerb->add_flag("--half-valid", poOptions->building.mbHalfValid,

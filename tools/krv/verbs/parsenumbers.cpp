@@ -4,27 +4,52 @@
 #include <charconv>
 #include <limits>
 #include <string>
+#include <string_view>
 
 namespace krv::tool
 {
 
+namespace
+{
+
+constexpr std::size_t MOST_NUMBERS = 65536;
+
+// The number that a text begins with, which is taken off it.
+unsigned int TakeNumber(std::string_view& rest, const std::string& text, const std::string& option)
+{
+    unsigned int nNumber = 0;
+    const auto [pNext, eError] = std::from_chars(rest.data(), rest.data() + rest.size(), nNumber);
+    if (eError == std::errc::result_out_of_range)
+        throw UsageError(option + ": \"" + text + "\" holds a number above " +
+                         std::to_string(std::numeric_limits<unsigned int>::max()) + "; give smaller ones");
+    if (eError != std::errc())
+        throw UsageError(option + ": \"" + text + "\" is no list of numbers such as 1,2,3 or 1-3");
+    rest.remove_prefix(static_cast<std::size_t>(pNext - rest.data()));
+    return nNumber;
+}
+
+} // namespace
+
 std::vector<unsigned int> ParseNumbers(const std::string& text, const std::string& option)
 {
     std::vector<unsigned int> oNumbers;
-    const char* pAt = text.data();
-    const char* const pEnd = pAt + text.size();
-    while (pAt != pEnd)
+    std::string_view rest = text;
+    while (!rest.empty())
     {
-        unsigned int nNumber = 0;
-        const auto [pNext, eError] = std::from_chars(pAt, pEnd, nNumber);
-        const bool bLast = pNext == pEnd;
-        if (eError == std::errc::result_out_of_range)
-            throw UsageError(option + ": \"" + text + "\" holds a number above " +
-                             std::to_string(std::numeric_limits<unsigned int>::max()) + "; give smaller ones");
-        if (eError != std::errc() || (!bLast && (*pNext != ',' || pNext + 1 == pEnd)))
-            throw UsageError(option + ": \"" + text + "\" is no list of numbers such as 1,2,3");
-        oNumbers.push_back(nNumber);
-        pAt = bLast ? pEnd : pNext + 1;
+        const unsigned int nFirst = TakeNumber(rest, text, option);
+        unsigned int nLast = nFirst;
+        if (rest.starts_with('-'))
+        {
+            rest.remove_prefix(1);
+            nLast = TakeNumber(rest, text, option);
+        }
+        if (nLast < nFirst || nLast - nFirst >= MOST_NUMBERS)
+            throw UsageError(option + ": \"" + text + "\" holds a range that does not count upwards, or too far");
+        for (unsigned int n = nFirst; n - nFirst <= nLast - nFirst; ++n)
+            oNumbers.push_back(n);
+        if (!rest.empty() && (rest.front() != ',' || rest.size() == 1))
+            throw UsageError(option + ": \"" + text + "\" is no list of numbers such as 1,2,3 or 1-3");
+        rest.remove_prefix(rest.empty() ? 0 : 1);
     }
     return oNumbers;
 }

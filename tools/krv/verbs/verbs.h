@@ -4,13 +4,16 @@
 
 #include <cstddef>
 #include <functional>
+#include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace CLI
 {
 class App;
-}
+class Option;
+} // namespace CLI
 
 namespace krv::tool
 {
@@ -33,15 +36,47 @@ void AddConvertVerb(CLI::App& oApp, Selection& oSelection);
 void AddLinkVerb(CLI::App& oApp, Selection& oSelection);
 void AddOverviewsVerb(CLI::App& oApp, Selection& oSelection);
 void AddMaskVerb(CLI::App& oApp, Selection& oSelection);
+void AddEditVerb(CLI::App& oApp, Selection& oSelection);
+void AddSampleVerb(CLI::App& oApp, Selection& oSelection);
 void AddWarpVerb(CLI::App& oApp, Selection& oSelection);
 void AddDoctorVerb(CLI::App& oApp, Selection& oSelection);
+void AddDescribeVerb(CLI::App& oApp, Selection& oSelection);
 
-// "1,2,5" as numbers; an empty text is an empty list. Throws UsageError naming the option.
+// "1,2,5-7" as numbers; an empty text is an empty list. Throws UsageError naming the option.
 std::vector<unsigned int> ParseNumbers(const std::string& text, const std::string& option);
 
 // "1.5,-2e3" as so many numbers; an empty text is an empty list. Throws UsageError naming the option.
 std::vector<double> ParseReals(const std::string& text, const std::string& option, std::size_t nLeast,
                                std::size_t nMost);
+
+// Nothing for an option that was not given.
+inline std::optional<std::string> GivenOrNone(const std::string& text)
+{
+    return text.empty() ? std::nullopt : std::optional(text);
+}
+
+// Adds an option that takes one of some words, in any letter case. oTake: gets the place of the word in the list.
+CLI::Option* AddWords(CLI::App& oVerb, const std::string& name, const std::string& what,
+                      const std::vector<std::string>& oWords, std::function<void(std::size_t)> oTake);
+
+// The same for the word itself, in the letters of the list.
+inline CLI::Option* AddWord(CLI::App& oVerb, const std::string& name, std::string& oTarget, const std::string& what,
+                            const std::vector<std::string>& oWords)
+{
+    return AddWords(oVerb, name, what, oWords, [&oTarget, oWords](std::size_t nWord) { oTarget = oWords[nWord]; });
+}
+
+// The same for values that the words stand for.
+template <class Value>
+CLI::Option* AddChoice(CLI::App& oVerb, const std::string& name, Value& oTarget, const std::string& what,
+                       const std::vector<std::pair<std::string, Value>>& oChoices)
+{
+    std::vector<std::string> oWords;
+    for (const auto& oChoice : oChoices)
+        oWords.push_back(oChoice.first);
+    return AddWords(oVerb, name, what, oWords,
+                    [&oTarget, oChoices](std::size_t nWord) { oTarget = oChoices[nWord].second; });
+}
 
 // A part of the image as users name it: in pixels, in map coordinates, or where another file lies.
 struct WindowOptions

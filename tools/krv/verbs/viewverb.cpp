@@ -10,7 +10,6 @@
 #include <fmt/format.h>
 
 #include <filesystem>
-#include <map>
 #include <memory>
 #include <system_error>
 
@@ -26,6 +25,7 @@ struct Options
 {
     std::string target;
     std::string channels;
+    std::string noData;
     bool nearest = false;
     QuickLookOptions look;
 };
@@ -51,17 +51,23 @@ const char* ReasonText(DisplayReason eReason)
     }
 }
 
-std::string Describe(const QuickLook& oLook)
+std::string Describe(const SourceFile& oFile, const QuickLook& oLook)
 {
     const DisplayChoice& oChoice = oLook.choice;
-    std::string text = fmt::format("channel{} {} ({})", oChoice.channels.size() > 1 ? "s" : "",
-                                   fmt::join(oChoice.channels, ", "), ReasonText(oChoice.reason));
+    std::string text = oLook.power ? std::string("total power")
+                                   : fmt::format("channel{} {} ({})", oChoice.channels.size() > 1 ? "s" : "",
+                                                 fmt::join(oChoice.channels, ", "), ReasonText(oChoice.reason));
     if (oChoice.table != nullptr)
         return text + ", colour table";
     text += ", shown from";
-    for (const Stretch& oStretch : oLook.stretches)
-        text += fmt::format(" {:g}..{:g}", oStretch.low, oStretch.high);
-    return text;
+    for (std::size_t c = 0; c < oLook.stretches.size(); ++c)
+    {
+        const Stretch& oStretch = oLook.stretches[c];
+        const bool bStored = oLook.power || oLook.decibels || oChoice.channels.size() <= c;
+        const ValueScale oScale = bStored ? ValueScale() : oFile.GetScale(oChoice.channels[c]);
+        text += fmt::format(" {:.4g}..{:.4g}", oScale(oStretch.low), oScale(oStretch.high));
+    }
+    return text + (oLook.decibels ? " dB" : "");
 }
 
 int RunView(const std::string& file, Options& oOptions)
@@ -71,11 +77,14 @@ int RunView(const std::string& file, Options& oOptions)
     std::error_code oNone;
     if (std::filesystem::equivalent(file, oOptions.target, oNone))
         throw UsageError(oOptions.target + " is the file itself; name another for the quick look");
-    const SourceFile oFile(file);
+    if (!IsPictureName(oOptions.target))
+        throw UsageError(oOptions.target + ": pictures are written as .png or .jpg, or to - as PNG");
+    const SourceFile oFile(file, eReadOnly, GivenOrNone(oOptions.noData));
     const QuickLook oLook = MakeQuickLook(oFile, oOptions.look, ShowProgress(), GetExecutor());
-    WritePng(oLook.picture, oOptions.target);
-    Print(
-        fmt::format("{}: {} x {}, {}\n", oOptions.target, oLook.picture.width, oLook.picture.height, Describe(oLook)));
+    WritePicture(oLook.picture, oOptions.target);
+    if (oOptions.target != "-")
+        Print(fmt::format("{}: {} x {}, {}\n", oOptions.target, oLook.picture.width, oLook.picture.height,
+                          Describe(oFile, oLook)));
     return 0;
 }
 
@@ -83,23 +92,30 @@ int RunView(const std::string& file, Options& oOptions)
 
 void AddViewVerb(CLI::App& oApp, Selection& oSelection)
 {
-    auto* const poVerb = oApp.add_subcommand("view", "Makes a quick look as PNG, missing pixels transparent");
+    auto* const poVerb = oApp.add_subcommand("view", "Makes a quick look as PNG or JPEG, missing pixels transparent");
     const auto poOptions = std::make_shared<Options>();
-    const std::map<std::string, StretchMode> oModes{{"auto", StretchMode::eAuto},
-                                                    {"none", StretchMode::eNone},
-                                                    {"percentile", StretchMode::ePercentile},
-                                                    {"minmax", StretchMode::eMinMax}};
     poVerb->add_option("FILE", oSelection.file, "The file")->required();
-    poVerb->add_option("OUT", poOptions->target, "The PNG file to write; it is replaced")->required();
+    poVerb
+        ->add_option("OUT", poOptions->target,
+                     "The picture to write, .png or .jpg; it is replaced. - is PNG on the standard output")
+        ->required();
     poVerb->add_option("--size", poOptions->look.size, "Longest side in pixels (1024); nothing is enlarged")
         ->check(CLI::Range(1, 16384));
     poVerb->add_option("--channels", poOptions->channels,
                        "Three as red,green,blue or a single one; otherwise what the file says, else the first");
-    poVerb
-        ->add_option("--stretch", poOptions->look.stretch,
-                     "auto: 8-bit data of good contrast as it is, else percentile (the 2nd black, the 98th white); "
-                     "none: 0 to 255 as they are; minmax")
-        ->transform(CLI::CheckedTransformer(oModes, CLI::ignore_case));
+    AddChoice<StretchMode>(*poVerb, "--stretch", poOptions->look.stretch,
+                           "auto: 8-bit colours, and 8-bit data of good contrast, as they are, else percentile (the "
+                           "2nd black, the 98th white, without a black collar); none: 0 to 255 as they are; minmax",
+                           {{"auto", StretchMode::eAuto},
+                            {"none", StretchMode::eNone},
+                            {"percentile", StretchMode::ePercentile},
+                            {"minmax", StretchMode::eMinMax}});
+    poVerb->add_flag("--power", poOptions->look.power,
+                     "The power of a radar scene, all channels together; complex files are shown so by themselves");
+    poVerb->add_flag("--decibels", poOptions->look.decibels, "Values in decibels: 10 times their logarithm");
+    poVerb->add_flag("--legend", poOptions->look.legend,
+                     "Below the picture what its levels or colours stand for; of one channel");
+    poVerb->add_option("--no-data", poOptions->noData, "The no-data value, in place of the recorded one");
     poVerb->add_flag("--nearest", poOptions->nearest, "Take single pixels instead of means: for class numbers");
     poVerb->callback(
         [&oSelection, poOptions]

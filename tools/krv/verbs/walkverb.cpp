@@ -135,18 +135,18 @@ void AddWalkVerb(CLI::App& oApp, Selection& oSelection)
     auto* const poVerb =
         oApp.add_subcommand("walk", "Reads every tile with margins, as processing does, and says how fast");
     const auto poOptions = std::make_shared<Options>();
-    const std::map<std::string, eMarginBehaviour> oBehaviours{{"exception", eException}, {"replicate", eReplicate},
-                                                              {"mirror", eMirror},       {"mirror101", eMirror101},
-                                                              {"constant", eConstant},   {"wrap", eWrap}};
     poVerb->add_option("FILE", oSelection.file, "The file")->required();
     poVerb->add_option("--channels", poOptions->channels, "Only these, such as 1,3");
     poVerb->add_option("--margins", poOptions->margins, "Pixels left and right, above and below: 8,8 or 8 (0)");
     poVerb->add_option("--tile", poOptions->tile, "Tile size: 512,512 or 512 (the format's own block)");
-    poVerb
-        ->add_option("--behaviour", poOptions->behaviour,
-                     "How pixels outside the image are made: exception, replicate, mirror (the default), mirror101, "
-                     "constant, wrap")
-        ->transform(CLI::CheckedTransformer(oBehaviours, CLI::ignore_case));
+    AddChoice<eMarginBehaviour>(*poVerb, "--behaviour", poOptions->behaviour,
+                                "How pixels outside the image are made (mirror)",
+                                {{"exception", eException},
+                                 {"replicate", eReplicate},
+                                 {"mirror", eMirror},
+                                 {"mirror101", eMirror101},
+                                 {"constant", eConstant},
+                                 {"wrap", eWrap}});
     poVerb->add_flag("--json", poOptions->json, "As JSON");
     poVerb->callback(
         [&oSelection, poOptions]

@@ -77,10 +77,9 @@ void AddWarpVerb(CLI::App& oApp, Selection& oSelection)
     poVerb->add_option("--resolution", poOptions->resolution,
                        "Map units of a pixel, such as 30, or of a column and a row (the file's)");
     poVerb->add_option("--size", poOptions->size, "Columns,rows in place of a resolution");
-    poVerb
-        ->add_option("--resampling", poOptions->resampling,
-                     "bilinear (mode for indices of a colour table), nearest, cubic, lanczos, average, mode")
-        ->check(CLI::IsMember({"nearest", "bilinear", "cubic", "lanczos", "average", "mode"}, CLI::ignore_case));
+    AddWord(*poVerb, "--resampling", poOptions->resampling,
+            "How pixels are made: bilinear, of indices of a colour table mode, unless said",
+            {"nearest", "bilinear", "cubic", "lanczos", "average", "mode"});
     poVerb->add_option("--channels", poOptions->channels, "Only these, in this order, such as 3,1");
     poVerb->add_option("--nodata", poOptions->noData,
                        "The value of pixels without a source (the file's own; else a mask tells them)");

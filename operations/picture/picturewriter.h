@@ -22,4 +22,11 @@ struct Picture
 // file and the cause; nothing is left behind then.
 KRV_OPERATIONS_API void WritePng(const Picture& oPicture, const std::string& fileName);
 
+// Whether WritePicture writes files of that name: ".png", ".jpg" and ".jpeg" in any letter case, and "-".
+KRV_OPERATIONS_API bool IsPictureName(const std::string& fileName);
+
+// The same in the form that the name says; "-" is PNG on the standard output. JPEG has no transparency: such pixels are
+// white. Throws RequestException for another name.
+KRV_OPERATIONS_API void WritePicture(const Picture& oPicture, const std::string& fileName);
+
 } // namespace krv::operations
