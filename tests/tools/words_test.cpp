@@ -56,8 +56,8 @@ TEST(Words, RangesTypesAndSeveralFilesAreUnderstood)
     EXPECT_NEAR(oNew["percentiles"][1]["value"].get<double>(), oOld["percentiles"][0]["value"].get<double>(), 0.01);
     EXPECT_NEAR(oNew["percentiles"][0]["value"].get<double>(), oOld["min"].get<double>(), 0.01);
     std::uint64_t nCounted = 0;
-    for (const json& oCount :
-         RunKrv({"stats", scene, "--bins", "7", "--json"}).Json()["channels"][1]["histogram"]["counts"])
+    const json oBinned = RunKrv({"stats", scene, "--bins", "7", "--json"}).Json();
+    for (const json& oCount : oBinned["channels"][1]["histogram"]["counts"])
         nCounted += oCount.get<std::uint64_t>();
     EXPECT_EQ(oOld["valid"], nCounted);
 }
