@@ -126,8 +126,9 @@ void ReadAll(IRasterReader& oReader)
     }
 }
 
-// A kernel against memcpy of nCopied bytes a pixel into the same buffer: of 64 Ki pixels, whose input and output stay
-// in the second-level cache, and of all of them, which do not. Processor time.
+// A kernel against memcpy of nCopied bytes a pixel into the same buffer: of the same 64 Ki pixels again and again,
+// whose input and output stay in the nearer caches, and of all pixels one after the other, which do not. Processor
+// time.
 template <typename Kernel>
 void MeasureKernel(const std::string& name, const Bytes& oInput, std::size_t nPixels, std::size_t nInputBytes,
                    std::size_t nOutputBytes, std::size_t nCopied, double nGoal, const Kernel& oKernel)

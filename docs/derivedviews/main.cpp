@@ -21,8 +21,10 @@
 #include <cstdio>
 #include <exception>
 #include <memory>
+#include <numeric>
 #include <random>
 #include <string>
+#include <vector>
 
 namespace
 {
@@ -45,7 +47,9 @@ void Copy(IRasterReader& oReader, IRasterWriter& oWriter)
 
 void Store(IRasterReader& oReader, const std::string& file)
 {
-    BasicWriter oWriter(file, {}, "TIF", "");
+    std::vector<unsigned int> oChannels(oReader.GetChansCount());
+    std::iota(oChannels.begin(), oChannels.end(), 1u);
+    BasicWriter oWriter(file, oChannels, "TIF", "");
     oWriter.CreateNewFile({oReader.GetWidth(), oReader.GetHeight(), oReader.GetChansCount(), oReader.GetDataType()});
     oWriter.SetAuxiliaryData(oReader.GetAuxiliaryData().GetCleanedMeta());
     Copy(oReader, oWriter);
