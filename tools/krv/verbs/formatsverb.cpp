@@ -86,7 +86,7 @@ std::string OptionsText(const Json& oFormat)
 {
     std::string text;
     for (const Json& oOption : oFormat["options"])
-        text += fmt::format("  {:<14}{}\n", OneLine(oOption["key"].get<std::string>()),
+        text += fmt::format("  {:<16}{}\n", OneLine(oOption["key"].get<std::string>()),
                             OneLine(oOption["takes"].get<std::string>()));
     return text.empty() ? text
                         : fmt::format("\nOptions of a new {}\n{}", OneLine(oFormat["name"].get<std::string>()), text);
