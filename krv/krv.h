@@ -25,6 +25,7 @@
 #include "datasources/writer/basicwriter.h"
 #include "datasources/writer/copyallbutpixels.h"
 #include "datasources/writer/replacingwriter.h"
+#include "datasources/writer/tilewriting.h"
 #include "gobs/mask/mask.h"
 #include "gobs/pct/pct.h"
 #include "gobs/raster/raster.h"
@@ -82,6 +83,7 @@ using datasources::CopyAllButPixels;
 using datasources::GetDefaultLevels;
 using datasources::IRasterWriter;
 using datasources::ReplacingWriter;
+using datasources::WriteTiles;
 
 // What belongs to an image.
 using datasources::AuxiliaryData;

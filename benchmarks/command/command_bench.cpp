@@ -1,6 +1,7 @@
 // Measures the command line beside `vips` and `tiffcp`, whole processes on warm files, one thread each, the new files
 // safe on the disk by krv and left to the system to write by the others; a program that is not installed is left out.
-//     krv_bench_command FOLDER [--size N]
+// Then two threads beside one, and beside `vips` and `cp` with `sync`.
+//     krv_bench_command FOLDER [--size N] [--only one|threads]
 // FOLDER keeps the scenes for the next run.
 
 #include "benchmarks/support/arguments.h"
@@ -88,11 +89,88 @@ void Measure(const std::string& workload, std::vector<Program> oPrograms)
         std::filesystem::remove(oProgram.moTarget);
 }
 
+// How often the first command fits into the time of each other one, the goals with them.
+struct Rival
+{
+    std::string moName;
+    Words moWords;
+    double mnGoal;
+};
+
+void Compare(const std::string& workload, const Words& oFirst, std::vector<Rival> oRivals, const std::string& target)
+{
+    const auto Repeat = [target](const Words& oWords)
+    {
+        if (!target.empty())
+            std::filesystem::remove(target);
+        return Run(oWords);
+    };
+    std::erase_if(oRivals, [&](const Rival& oRival) { return !Repeat(oRival.moWords); });
+    std::vector<Candidate> oCandidates{{"krv", [&]
+                                        {
+                                            Repeat(oFirst);
+                                        }}};
+    for (const Rival& oRival : oRivals)
+        oCandidates.push_back({oRival.moName, [&]
+                               {
+                                   Repeat(oRival.moWords);
+                               }});
+    const auto oTimes = MedianSeconds(oCandidates, 5);
+    for (std::size_t n = 0; n < oRivals.size(); ++n)
+        PrintRow(workload + ", against " + oRivals[n].moName, oTimes[n + 1] / oTimes[0], oRivals[n].mnGoal,
+                 Number(oTimes[0] * 1000, 0) + " and " + Number(oTimes[n + 1] * 1000, 0) + " ms");
+    if (!target.empty())
+        std::filesystem::remove(target);
+}
+
+// krv with two threads. The copy of equal form is of the image without a codec.
+void MeasureThreads(const std::string& krv, const std::string& plain, const std::string& zipped,
+                    const std::string& target)
+{
+    const auto With = [](Words oWords, const Words& oMore)
+    {
+        oWords.insert(oWords.end(), oMore.begin(), oMore.end());
+        return oWords;
+    };
+    const auto Threads = [&](const Words& oWords, const char* pCount)
+    {
+        return With(With({krv}, oWords), {"--threads", pCount});
+    };
+    const Words VIPS = {"env",    "VIPS_CONCURRENCY=2", "vips",    "tiffsave",      zipped,
+                        target,   "--compression",      "deflate", "--predictor",   "horizontal",
+                        "--tile", "--tile-width",       "512",     "--tile-height", "512"};
+    const Words oAnew = {"convert", zipped, target, "--options", "BLOCKXSIZE=512 BLOCKYSIZE=512"};
+    const Words oCloud = {"convert", zipped, target, "--options", "LAYOUT=COG BLOCKXSIZE=512 BLOCKYSIZE=512"};
+    const Words oStatistics = {"stats", zipped};
+    PrintHeading("Two threads");
+    Compare("deflate to deflate of other blocks", Threads(oAnew, "2"),
+            {{"one thread", Threads(oAnew, "1"), 1.8}, {"vips", VIPS, 2.5}}, target);
+    Compare("deflate to COG with levels", Threads(oCloud, "2"),
+            {{"one thread", Threads(oCloud, "1"), 1.8}, {"vips", With(VIPS, {"--pyramid", "--subifd"}), 1.8}}, target);
+    Compare("stats of deflate", Threads(oStatistics, "2"),
+            {{"one thread", Threads(oStatistics, "1"), 1.8},
+             {"vips", {"env", "VIPS_CONCURRENCY=2", "vips", "stats", zipped, target + ".v"}, 1.7}},
+            "");
+    std::filesystem::remove(target + ".v");
+    Compare("same codec and blocks", Threads({"convert", plain, target}, "2"),
+            {{"cp and sync", {"sh", "-c", "cp --reflink=never \"$0\" \"$1\" && sync \"$1\"", plain, target}, 0.8}},
+            target);
+    const std::string levels = target + ".levels.tif";
+    std::filesystem::copy_file(zipped, levels, std::filesystem::copy_options::overwrite_existing);
+    for (const char* const pMethod : {"average", "cubic"})
+    {
+        const Words oLevels = {"overviews", levels, "--levels", "2,4,8,16", "--resampling", pMethod};
+        Compare(std::string("overviews of deflate, ") + pMethod, Threads(oLevels, "2"),
+                {{"one thread", Threads(oLevels, "1"), 1.8}}, "");
+    }
+    std::filesystem::remove(levels);
+}
+
 } // namespace
 
 int main(int nArguments, char** pArguments)
 {
-    const Arguments oArguments(nArguments, pArguments, "FOLDER [--size N]");
+    const Arguments oArguments(nArguments, pArguments, "FOLDER [--size N] [--only one|threads]");
     const std::string& folder = oArguments.GetWords().front();
     const unsigned int nSize = oArguments.GetNumber("size", 8192) / 512 * 512;
     std::filesystem::create_directories(folder);
@@ -108,6 +186,10 @@ int main(int nArguments, char** pArguments)
     const SceneKind oKind{"3x8U", 3, 8, false};
     const std::string plain = MakeScene(folder, oKind, "none", 256, nSize).moPath;
     const std::string zipped = MakeScene(folder, oKind, "deflate", 256, nSize).moPath;
+    if (oArguments.Wants("threads"))
+        MeasureThreads(krv, plain, zipped, k);
+    if (!oArguments.Wants("one"))
+        return 0;
     const Words TILES = {"--tile", "--tile-width", "256", "--tile-height", "256"};
     const auto Vips = [&](const std::string& source, const Words& oMore)
     {

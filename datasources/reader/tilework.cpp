@@ -1,27 +1,8 @@
 #include "datasources/reader/tilework.h"
 
-#include "datasources/reader/basicreader.h"
-#include "datasources/reader/exacthaloreader.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/threading/foreachitem.h"
 #include "toolkit/threading/statestore.h"
-
-namespace krv::datasources
-{
-
-ReaderFactory MakeExactReaders(const std::string& fileName, const std::vector<unsigned int>& oChannels,
-                               unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour)
-{
-    return [=]
-    {
-        auto poFile = std::make_unique<BasicReader>(fileName, oChannels);
-        auto poReader = std::make_unique<ExactHaloReader>(poFile.release(), true);
-        poReader->SetMargins(nXMargin, nYMargin, eBehaviour);
-        return poReader;
-    };
-}
-
-} // namespace krv::datasources
 
 namespace krv::datasources::detail
 {

@@ -8,10 +8,8 @@
 
 #include <functional>
 #include <memory>
-#include <string>
 #include <type_traits>
 #include <utility>
-#include <vector>
 
 namespace krv::datasources
 {
@@ -19,12 +17,6 @@ namespace krv::datasources
 // Makes a reader for one thread, over a dataset of its own, with tile size and margins set; all that it makes are
 // alike. Called by any of the threads, by several at once. The first call is made by the thread that starts the work.
 using ReaderFactory = std::function<std::unique_ptr<IRasterReader>()>;
-
-// Readers of channels of a file, opened anew for each, with the file's own tiles and margins that are exact at the
-// border of the image too (ExactHaloReader). Nothing is opened before one is made, which throws what opening throws.
-KRV_DATASOURCES_API ReaderFactory MakeExactReaders(const std::string& fileName,
-                                                   const std::vector<unsigned int>& oChannels, unsigned int nXMargin,
-                                                   unsigned int nYMargin, eMarginBehaviour eBehaviour);
 
 struct TileJob
 {

@@ -1,18 +1,14 @@
 // Smooths the first channel of an 8-bit scene on all cores, without seams; Ctrl-C stops it and leaves nothing.
-#include "datasources/writer/basicwriter.h"
-#include "datasources/writer/tilewriting.h"
-#include "gobs/raster/rasterview.h"
-#include "toolkit/threading/threadpool.h"
 #include <csignal>
 #include <iostream>
-using namespace krv::datasources;
-using namespace krv::gobs;
+#include <krv/krv.h>
 static volatile std::sig_atomic_t gnStopped = 0;
-static std::unique_ptr<Raster> Smooth(std::unique_ptr<Raster> poTile) // on any thread
+static std::unique_ptr<krv::Raster> Smooth(std::unique_ptr<krv::Raster> poTile) // on any thread
 {
-    auto poResult = std::make_unique<Raster>(poTile->GetInfo(), RasterContext(poTile->GetX(), poTile->GetY()));
-    const RasterView<const unsigned char> oFrom(*poTile);
-    const int nWidth = static_cast<int>(poTile->GetWidth());
+    auto poResult =
+        std::make_unique<krv::Raster>(poTile->GetInfo(), krv::RasterContext(poTile->GetX(), poTile->GetY()));
+    const krv::RasterView<const unsigned char> oFrom(*poTile);
+    const auto nWidth = static_cast<int>(poTile->GetWidth());
     for (int n = 0, nSum = 0; n < nWidth * static_cast<int>(poTile->GetHeight()); ++n, nSum = 0)
     {
         for (int i = 0; i < 9; ++i)
@@ -21,19 +17,22 @@ static std::unique_ptr<Raster> Smooth(std::unique_ptr<Raster> poTile) // on any 
     }
     return poResult;
 }
+static bool Show(unsigned int n, unsigned int nAll)
+{
+    return (std::cerr << n << '/' << nAll << '\r') && gnStopped == 0;
+}
 int main(int, char** pFiles)
 {
     std::signal(SIGINT, [](int) { gnStopped = 1; });
-    const auto oReaders = MakeExactReaders(pFiles[1], {1}, 1, 1, eMirror);
-    const auto poScene = oReaders();
-    BasicWriter oWriter(pFiles[2], {1}, "TIF", "COMPRESS=DEFLATE");
-    oWriter.CreateNewFile({poScene->GetWidth(), poScene->GetHeight(), 1, eDT_8U});
-    krv::threading::ThreadPool oThreads;
-    TileJob oJob{&oThreads};
-    oJob.moProgress = [](unsigned int n, unsigned int nAll)
+    const auto Open = [pFiles] // one for each thread
     {
-        return (std::cerr << n << '/' << nAll << '\r') && gnStopped == 0;
+        return krv::OpenHaloReader(pFiles[1], {1}, 1);
     };
-    if (WriteTiles(oReaders, Smooth, oWriter, oJob))
-        oWriter.Synchronize();
+    const auto poScene = Open();
+    const krv::RasterInfo oInfo(poScene->GetWidth(), poScene->GetHeight(), 1, krv::eDT_8U);
+    const auto poWriter = krv::CreateWriter(pFiles[2], oInfo, "TIF", "COMPRESS=DEFLATE");
+    krv::CopyAllButPixels(*poScene, *poWriter);
+    krv::ThreadPool oThreads;
+    if (krv::WriteTiles(Open, Smooth, *poWriter, {&oThreads, {}, Show}))
+        poWriter->Synchronize();
 }
