@@ -48,16 +48,20 @@ endif()
 find_package(Threads REQUIRED)
 find_package(PkgConfig REQUIRED)
 
-# krv_add_library(NAME FOLDERS f... PUBLIC libs... PRIVATE libs...): a shared library of all sources below the folders.
-# <NAME>_EXPORTS is what its export macro looks at.
+# krv_add_library(NAME FOLDERS f... EXCEPT regex SOURCES s... PUBLIC libs... PRIVATE libs...): a shared library of all
+# sources below the folders but those that the expression matches, and of the sources. <NAME>_EXPORTS is what its export
+# macro looks at.
 function(krv_add_library name)
-  cmake_parse_arguments(ARG "" "" "FOLDERS;PUBLIC;PRIVATE" ${ARGN})
+  cmake_parse_arguments(ARG "" "EXCEPT" "FOLDERS;SOURCES;PUBLIC;PRIVATE" ${ARGN})
   set(sources)
   foreach(folder IN LISTS ARG_FOLDERS)
     file(GLOB_RECURSE found CONFIGURE_DEPENDS ${CMAKE_CURRENT_SOURCE_DIR}/${folder}/*.cpp)
     list(APPEND sources ${found})
   endforeach()
-  add_library(${name} SHARED ${sources})
+  if(ARG_EXCEPT)
+    list(FILTER sources EXCLUDE REGEX ${ARG_EXCEPT})
+  endif()
+  add_library(${name} SHARED ${sources} ${ARG_SOURCES})
   target_include_directories(${name} PUBLIC $<BUILD_INTERFACE:${CMAKE_SOURCE_DIR}>
                                             $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/krv>)
   target_compile_features(${name} PUBLIC cxx_std_20)

@@ -8,6 +8,7 @@
 #include "plugins/support/codec/checksum.h"
 #include "toolkit/exceptions/exceptions.h"
 
+#include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/metadata/auxiliarydata.h"
 
@@ -65,6 +66,17 @@ void Change(const std::string& fileName)
                 std::vector<unsigned char> oPixel(64, 7);
                 poIO->WriteWindow(0U, 0U, 1U, 1U, oPixel.data());
             });
+    Try(
+        [&]
+        {
+            std::vector<unsigned char> oTile;
+            if (poDataset->ReadEncoded(1, {}, oTile))
+                poDataset->StoreEncoded(1, {}, oTile.data(), oTile.size());
+        });
+    const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(poDataset->GetOverviewManager());
+    Try([&] { poLevels->CreateLevel(2); });
+    Try([&] { poDataset->SetEncodedForm(2, poDataset->GetEncodedForm(2)); });
+    Try([&] { poLevels->DeleteLevel(4); });
     Try([&] { poDataset->WriteAuxiliaryData(poDataset->ReadAuxiliaryData()); });
     const std::vector<unsigned int> oBitmaps = poDataset->GetBitmapList();
     if (!oBitmaps.empty())

@@ -1,5 +1,7 @@
 // krv_fuzz_seeds FOLDER: inputs to start from. FOLDER/tif: small TIFF files of every layout, byte order and
-// compression, of several types, with levels, masks and palettes; FOLDER/update: those with programs that change them.
+// compression, of several types, with levels, masks and palettes; FOLDER/update: those with programs that change them;
+// FOLDER/krvdsk: native files of every coding with something of everything, as they are and to be sealed anew.
+#include "tests/plugins/krvdsk/changes.h"
 #include "tests/support/tiffwriter.h"
 
 #include <cstdio>
@@ -72,6 +74,28 @@ void WriteUpdates(const std::filesystem::path& oFrom, const std::filesystem::pat
     }
 }
 
+void WriteNative(const std::filesystem::path& oFolder)
+{
+    for (const char* pCoding : {"NONE", "DEFLATE", "ZSTD", "LZ4", "LZW"})
+        for (const char* pInterleave : {"PIXEL", "BAND"})
+        {
+            const std::string name = std::string(pCoding) + pInterleave, file = (oFolder / name).string();
+            std::mt19937 oRandom(3);
+            {
+                const krv::test::NativePointer poNew = krv::test::CreateNative(
+                    file, "BLOCKXSIZE=16 BLOCKYSIZE=16 COMPRESS=" + std::string(pCoding) + " INTERLEAVE=" + pInterleave,
+                    40, 30, {krv::gobs::eDT_8U, krv::gobs::eDT_8U, krv::gobs::eDT_32R});
+                for (const krv::test::Change eChange : krv::test::CHANGES)
+                    krv::test::Make(*poNew, eChange, oRandom);
+                poNew->Close();
+            }
+            const std::string bytes = krv::conformance::ReadFile(file);
+            std::filesystem::remove(file);
+            for (const char nWay : {'0', '1'}) // an even one: sealed anew
+                std::ofstream(oFolder / (name + nWay), std::ios::binary) << nWay << bytes;
+        }
+}
+
 } // namespace
 
 int main(int nArguments, char** pArguments)
@@ -85,7 +109,9 @@ try
     const std::filesystem::path oFolder = pArguments[1];
     std::filesystem::create_directories(oFolder / "tif");
     std::filesystem::create_directories(oFolder / "update");
+    std::filesystem::create_directories(oFolder / "krvdsk");
     WritePages(oFolder / "tif");
+    WriteNative(oFolder / "krvdsk");
     WriteUpdates(oFolder / "tif", oFolder / "update");
     return 0;
 }

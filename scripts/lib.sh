@@ -6,8 +6,8 @@ cd "$KRV_ROOT"
 
 # What each job needs, as Debian 12 packages.
 KRV_PACKAGES_BUILD=(g++ cmake ninja-build pkg-config
-    libxerces-c-dev libxalan-c-dev libboost-regex-dev libproj-dev proj-data
-    libtiff-dev libgeotiff-dev libjpeg62-turbo-dev libdeflate-dev libzstd-dev liblz4-dev zlib1g-dev libopenjp2-7-dev
+    libxerces-c-dev libxalan-c-dev libexpat1-dev libboost-regex-dev libproj-dev proj-data
+    libtiff-dev libgeotiff-dev libjpeg62-turbo-dev libdeflate-dev libisal-dev libzstd-dev liblz4-dev zlib1g-dev libopenjp2-7-dev
     libcli11-dev libfmt-dev nlohmann-json3-dev libpng-dev)
 KRV_PACKAGES_TEST=(libgtest-dev libgmock-dev)
 # What benchmarks compare with; nothing else needs them.

@@ -222,33 +222,45 @@ krv::ogc::cs::GeocodingInfo Turned(unsigned int nSize)
 }
 
 #ifdef KRV_BENCH_VIPS
-void TransformByVips(const Bytes& oBytes, unsigned int nSize, int nBands, VipsBandFormat eFormat, const char* pName)
+// What libvips does with an image in memory; the result is taken out of it.
+template <typename Operation>
+void RunVips(const Bytes& oBytes, unsigned int nSize, int nBands, VipsBandFormat eFormat, const Operation& oOperation)
 {
     VipsImage* const poImage = vips_image_new_from_memory(oBytes.data(), oBytes.size(), static_cast<int>(nSize),
                                                           static_cast<int>(nSize), nBands, eFormat);
-    VipsInterpolate* const poInterpolate = vips_interpolate_new(pName);
-    VipsArrayInt* const poArea = vips_array_int_newv(4, 0, 0, static_cast<int>(nSize), static_cast<int>(nSize));
     VipsImage* poOut = nullptr;
-    const double nCosine = std::cos(0.2), nSine = std::sin(0.2), nHalf = nSize / 2.0;
-    if (vips_affine(poImage, &poOut, nCosine, nSine, -nSine, nCosine, "interpolate", poInterpolate, "oarea", poArea,
-                    "odx", nHalf - nHalf * nCosine - nHalf * nSine, "ody", nHalf + nHalf * nSine - nHalf * nCosine,
-                    nullptr) != 0)
+    if (oOperation(poImage, &poOut) != 0)
         throw std::runtime_error(vips_error_buffer());
     std::size_t nResult = 0;
     void* const pResult = vips_image_write_to_memory(poOut, &nResult);
     Keep(pResult);
     g_free(pResult);
     g_object_unref(poOut);
+    g_object_unref(poImage);
+}
+
+// The map from the source to the result, which is of the size of the source.
+int TransformByVips(VipsImage* poImage, VipsImage** ppOut, const krv::ogc::cs::GeocodingInfo& oMap, const char* pName)
+{
+    VipsInterpolate* const poInterpolate = vips_interpolate_new(pName);
+    VipsArrayInt* const poArea =
+        vips_array_int_newv(4, 0, 0, vips_image_get_width(poImage), vips_image_get_height(poImage));
+    const double a = oMap.GetXPerColumn(), b = oMap.GetXPerRow(), c = oMap.GetYPerColumn(), d = oMap.GetYPerRow();
+    const double nDeterminant = a * d - b * c;
+    const int nFailed = vips_affine(poImage, ppOut, d / nDeterminant, -b / nDeterminant, -c / nDeterminant,
+                                    a / nDeterminant, "interpolate", poInterpolate, "oarea", poArea, "odx",
+                                    (b * oMap.GetYOffset() - d * oMap.GetXOffset()) / nDeterminant, "ody",
+                                    (c * oMap.GetXOffset() - a * oMap.GetYOffset()) / nDeterminant, nullptr);
     vips_area_unref(VIPS_AREA(poArea));
     g_object_unref(poInterpolate);
-    g_object_unref(poImage);
+    return nFailed;
 }
 #endif
 
 void MeasureTransforms([[maybe_unused]] unsigned int nSize, [[maybe_unused]] const char* pProgram)
 {
 #ifdef KRV_BENCH_VIPS
-    PrintHeading("Transforms, turned, against libvips with one thread");
+    PrintHeading("Transforms, against libvips with one thread");
     if (VIPS_INIT(pProgram) != 0)
         throw std::runtime_error("libvips does not start");
     vips_concurrency_set(1);
@@ -257,11 +269,16 @@ void MeasureTransforms([[maybe_unused]] unsigned int nSize, [[maybe_unused]] con
     {
         Resampling method;
         const char* name;
+        VipsKernel kernel;
         double goal;
     };
-    const Method METHODS[] = {{Resampling::eNearest, "nearest", 2},
-                              {Resampling::eBilinear, "bilinear", 2},
-                              {Resampling::eCubic, "bicubic", 1.5}};
+    const Method METHODS[] = {{Resampling::eNearest, "nearest", VIPS_KERNEL_NEAREST, 2},
+                              {Resampling::eBilinear, "bilinear", VIPS_KERNEL_LINEAR, 2},
+                              {Resampling::eCubic, "bicubic", VIPS_KERNEL_CUBIC, 1.5}};
+    // Coarser is a reduction there, whose kernels are stretched as here.
+    constexpr double COARSER = 2.6;
+    const std::pair<const char*, krv::ogc::cs::GeocodingInfo> MAPS[] = {
+        {"turned", Turned(nSize)}, {"finer", {10.3, 0.8, 0, 5.2, 0, 0.7}}, {"coarser", {0, COARSER, 0, 0, 0, COARSER}}};
     const Bytes oBytes = MakePixels<std::uint8_t>(nSize, 3), oReals = MakePixels<float>(nSize, 1);
     for (const bool bReal : {false, true})
     {
@@ -269,26 +286,37 @@ void MeasureTransforms([[maybe_unused]] unsigned int nSize, [[maybe_unused]] con
         const unsigned int nChannels = bReal ? 1 : 3;
         NoDataset oDataset(nChannels);
         MemoryReader oSource(oDataset, nChannels, bReal ? krv::gobs::eDT_32R : krv::gobs::eDT_8U, nSize, oPixels);
-        for (const Method& oMethod : METHODS)
+        for (const auto& [pMap, oMap] : MAPS)
         {
-            TransformRasterReader oReader(&oSource, std::make_shared<krv::gobs::AffineMap>(Turned(nSize)),
-                                          {nSize, nSize, oMethod.method}, false);
-            const auto oTimes =
-                MedianSeconds({{"reader",
-                                [&]
-                                {
-                                    ReadAll(oReader);
-                                }},
-                               {"vips",
-                                [&]
-                                {
-                                    TransformByVips(oPixels, nSize, static_cast<int>(nChannels),
-                                                    bReal ? VIPS_FORMAT_FLOAT : VIPS_FORMAT_UCHAR, oMethod.name);
-                                }}},
-                              5);
-            const double nMegapixels = static_cast<double>(nSize) * nSize / 1e6;
-            PrintRow((bReal ? "32R, " : "8U x 3, ") + std::string(oMethod.name), oTimes[1] / oTimes[0], oMethod.goal,
-                     Number(nMegapixels / oTimes[0], 0) + " megapixels a second");
+            const bool bCoarser = oMap.GetXPerColumn() == COARSER;
+            const unsigned int nResult = bCoarser ? static_cast<unsigned int>(nSize / COARSER) : nSize;
+            for (const Method& oMethod : METHODS)
+            {
+                const krv::ogc::cs::GeocodingInfo& oTerms = oMap; // a structured binding does not go into a closure
+                TransformRasterReader oReader(&oSource, std::make_shared<krv::gobs::AffineMap>(oMap),
+                                              {nResult, nResult, oMethod.method}, false);
+                const auto Vips = [&](VipsImage* poImage, VipsImage** ppOut)
+                {
+                    return bCoarser ? vips_reduce(poImage, ppOut, COARSER, COARSER, "kernel", oMethod.kernel, nullptr)
+                                    : TransformByVips(poImage, ppOut, oTerms, oMethod.name);
+                };
+                const auto oTimes = MedianSeconds({{"reader",
+                                                    [&]
+                                                    {
+                                                        ReadAll(oReader);
+                                                    }},
+                                                   {"vips",
+                                                    [&]
+                                                    {
+                                                        RunVips(oPixels, nSize, static_cast<int>(nChannels),
+                                                                bReal ? VIPS_FORMAT_FLOAT : VIPS_FORMAT_UCHAR, Vips);
+                                                    }}},
+                                                  5);
+                const double nMegapixels = static_cast<double>(nResult) * nResult / 1e6;
+                PrintRow(std::string(pMap) + ", " + (bReal ? "32R, " : "8U x 3, ") + oMethod.name,
+                         oTimes[1] / oTimes[0], bCoarser ? 0 : oMethod.goal,
+                         Number(nMegapixels / oTimes[0], 0) + " megapixels of the result a second");
+            }
         }
     }
 #endif

@@ -1,9 +1,12 @@
 // Measures files of plain pixels against pread and a straight loop, the other byte order against this machine's, and
-// levels in a file beside the image against levels inside. What is read is compared first.
+// levels in a file beside the image against levels inside, and what looking for files beside a TIFF costs where there
+// are none. What is read is compared first.
 
 #include "benchmarks/support/arguments.h"
 #include "benchmarks/support/measure.h"
+#include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/iomanager/datasetmanager.h"
@@ -12,6 +15,8 @@
 #include "datasources/reader/basicreader.h"
 #include "datasources/writer/basicwriter.h"
 #include "gobs/raster/raster.h"
+#include "toolkit/ogc/cs/geocodinginfo.h"
+#include "toolkit/ogc/cs/icrs.h"
 
 #include <fcntl.h>
 #include <unistd.h>
@@ -251,11 +256,51 @@ void MeasureLevels(const std::string& folder)
     PrintRow("levels through an .ovr against levels inside", oTimes[0] / oTimes[1], 0.97);
 }
 
+// All that a file says of itself.
+void AskAll(IDataset& oDataset)
+{
+    Keep(&dynamic_cast<IGeocodedDataset&>(oDataset).GetGeocoding());
+    const std::unique_ptr<krv::ogc::cs::ICRS> poCRS(oDataset.ReadCRS());
+    oDataset.ReadAuxiliaryData();
+    dynamic_cast<IBitmapDataset&>(oDataset).GetBitmapList();
+}
+
+// The same file under a name that is itself a sidecar's has none: nobody looks for them.
+void MeasureLooking(const std::string& folder)
+{
+    constexpr int TIMES = 400;
+    const std::string file = MakeFile(folder, "alone.tif", "TIF", "", krv::gobs::eDT_8U);
+    const std::string without = folder + "/alone.ovr";
+    std::filesystem::copy_file(file, without, std::filesystem::copy_options::overwrite_existing);
+    for (const bool bAsk : {false, true})
+    {
+        const auto OpenOften = [bAsk](const std::string& name)
+        {
+            for (int n = 0; n < TIMES; ++n)
+                if (const auto poDataset = Open(name); bAsk)
+                    AskAll(*poDataset);
+        };
+        const auto oTimes = MedianSeconds({{"looking",
+                                            [&]
+                                            {
+                                                OpenOften(file);
+                                            }},
+                                           {"without",
+                                            [&]
+                                            {
+                                                OpenOften(without);
+                                            }}},
+                                          ROUNDS);
+        PrintRow(bAsk ? "the same, asked for all that it says" : "opening a TIFF where no sidecar exists",
+                 oTimes[1] / oTimes[0], 1 / 1.1);
+    }
+}
+
 } // namespace
 
 int main(int nArguments, char** pArguments)
 {
-    const Arguments oArguments(nArguments, pArguments, "FOLDER [--only layouts|swapping|levels]");
+    const Arguments oArguments(nArguments, pArguments, "FOLDER [--only layouts|swapping|levels|looking]");
     const std::string folder = oArguments.GetWords().front();
     std::filesystem::create_directories(folder);
     PrintHeading("Plain pixels, against pread and a straight loop");
@@ -269,5 +314,7 @@ int main(int nArguments, char** pArguments)
     }
     if (oArguments.Wants("levels"))
         MeasureLevels(folder);
+    if (oArguments.Wants("looking"))
+        MeasureLooking(folder);
     return 0;
 }

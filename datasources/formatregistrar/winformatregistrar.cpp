@@ -2,21 +2,20 @@
 
 #include "datasources/interfaces/formatplugin.h"
 #include "datasources/iomanager/datasetmanager.h"
-#include "datasources/iomanager/xalanselect.h"
+#include "datasources/iomanager/detail/ownlibrary.h"
+#include "datasources/iomanager/detail/xmlsupport.h"
 #include "toolkit/core/core.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/debugger.h"
-#include "toolkit/xml/xmldocument.h"
+#include "toolkit/xml/limits.h"
+#include "toolkit/xml/xmltree.h"
 
-#include <xalanc/XalanDOM/XalanDOMString.hpp>
-#include <xalanc/XalanDOM/XalanDocument.hpp>
-#include <xalanc/XalanDOM/XalanNode.hpp>
-
-#include <dlfcn.h>
-
+#include <algorithm>
 #include <cerrno>
 #include <filesystem>
+#include <fstream>
 #include <memory>
+#include <string_view>
 #include <system_error>
 
 namespace krv::datasources
@@ -40,14 +39,39 @@ bool HasRegistry(const std::filesystem::path& oHome)
     return std::filesystem::exists(oHome / "etc" / GetFormatRegistryFilename(), oError);
 }
 
-std::filesystem::path OwnLibraryPath()
+// The library's own reader is enough for a document that is as it should be. What is wrong with another is said by
+// the XML parser's exception.
+krv::xml::Element ParseDescription(const std::string& path)
 {
-    Dl_info oInfo;
-    if (dladdr(reinterpret_cast<const void*>(&GetFormatRegistryFilename), &oInfo) == 0 || oInfo.dli_fname == nullptr)
-        return {};
-    std::error_code oError;
-    const auto oPath = std::filesystem::canonical(oInfo.dli_fname, oError);
-    return oError ? std::filesystem::path(oInfo.dli_fname) : oPath;
+    try
+    {
+        std::error_code oError;
+        if (!std::filesystem::is_regular_file(path, oError))
+            throw krv::DataException(path + ": not a regular file");
+        std::ifstream oFile(path, std::ios::binary);
+        std::string text(
+            std::min<std::uintmax_t>(std::filesystem::file_size(path, oError), krv::xml::MAX_DOCUMENT_BYTES + 1), '\0');
+        oFile.read(text.data(), static_cast<std::streamsize>(text.size()));
+        return krv::xml::ParseTree(text.data(), static_cast<std::size_t>(oFile.gcount()), path);
+    }
+    catch (const krv::DataException&)
+    {
+        detail::LoadXmlSupport().mpCheckFile(path);
+        throw;
+    }
+}
+
+// XPaths without prefixes find nothing in a document whose root declares what names without prefixes mean.
+bool IsRoot(const krv::xml::Element& oRoot, std::string_view name)
+{
+    return oRoot.name == name && oRoot.FindAttribute("xmlns") == nullptr;
+}
+
+std::string Trimmed(const std::string& text)
+{
+    constexpr char WHITE[] = " \t\r\n";
+    const std::size_t nFirst = text.find_first_not_of(WHITE);
+    return nFirst == std::string::npos ? "" : text.substr(nFirst, text.find_last_not_of(WHITE) + 1 - nFirst);
 }
 
 // The system's message text is not used, intended: the fixed text keeps messages equal everywhere, and the loader's own
@@ -70,16 +94,6 @@ void* FindEntryPoint(void* pLibrary, const char* pSymbol, const char* pMessage, 
     throw krv::LibraryException(libraryFile, krv::LibraryException::eEntryPointNotFound, message, oPlace);
 }
 
-void RegisterDescribedLibrary(const std::string& descriptionPath, DatasetManager* poManager)
-{
-    std::string libraryFile;
-    {
-        const krv::xml::Document oDescription = krv::xml::ParseFile(descriptionPath);
-        libraryFile = GetFormatLibraryFilename(SelectNodeValue("/Format/Object", oDescription.Get()), "so");
-    }
-    RegisterLibrary(libraryFile, descriptionPath, poManager);
-}
-
 } // namespace
 
 std::string GetFormatHome()
@@ -87,7 +101,7 @@ std::string GetFormatHome()
     const std::string home = IMPGetEnv("KRVHOME");
     if (!home.empty())
         return home;
-    const std::filesystem::path oLibrary = OwnLibraryPath();
+    const std::filesystem::path oLibrary = detail::OwnLibraryPath();
     for (std::filesystem::path oFolder = oLibrary.parent_path(); oFolder != oFolder.root_path();
          oFolder = oFolder.parent_path())
     {
@@ -115,19 +129,35 @@ std::string GetFormatLibraryPath(const std::string& libraryFile)
     return libraryFile.starts_with('/') ? libraryFile : inHome;
 }
 
+std::vector<std::string> ReadFormatRegistry(const std::string& path)
+{
+    const krv::xml::Element oRoot = ParseDescription(path);
+    std::vector<std::string> oDescriptions;
+    for (const krv::xml::Element& oChild : oRoot.children)
+    {
+        if (IsRoot(oRoot, "Formats") && oChild.name == "Format")
+            oDescriptions.push_back(Trimmed(oChild.text));
+    }
+    return oDescriptions;
+}
+
+std::string ReadFormatObject(const std::string& path)
+{
+    const krv::xml::Element oRoot = ParseDescription(path);
+    const krv::xml::Element* const poObject = IsRoot(oRoot, "Format") ? oRoot.FindChild("Object") : nullptr;
+    return poObject != nullptr ? Trimmed(poObject->text) : std::string();
+}
+
 void RegisterFormatLibraries(DatasetManager* poManager)
 {
     const std::string etc = EtcFolder(GetFormatHome());
-    unsigned int nCount = 0;
+    const std::vector<std::string> oDescriptions = ReadFormatRegistry(etc + "/" + GetFormatRegistryFilename());
+    for (const std::string& description : oDescriptions)
     {
-        const krv::xml::Document oRegistry = krv::xml::ParseFile(etc + "/" + GetFormatRegistryFilename());
-        for (const xalanc::XalanNode* poNode : SelectMultipleNode("/Formats/Format", oRegistry.Get()))
-        {
-            RegisterDescribedLibrary(etc + "/qrfformats/" + GetNodeText(*poNode), poManager);
-            ++nCount;
-        }
+        const std::string path = etc + "/qrfformats/" + description;
+        RegisterLibrary(GetFormatLibraryFilename(ReadFormatObject(path), "so"), path, poManager);
     }
-    if (nCount == 0)
+    if (oDescriptions.empty())
         throw krv::DataException("No format libraries registered successfully", Place::AtLine(236));
 }
 

@@ -3,6 +3,7 @@
 #include "datasources/api.h"
 
 #include <string>
+#include <vector>
 
 namespace krv::datasources
 {
@@ -25,6 +26,12 @@ KRV_DATASOURCES_API std::string GetFormatLibraryFilename(const std::string& base
 // Where a plug-in library is loaded from: a name is looked for in lib/qrfformats of the home and then left to the
 // system's search path, a relative path counts from lib/qrfformats, an absolute one stays. Never the current folder.
 KRV_DATASOURCES_API std::string GetFormatLibraryPath(const std::string& libraryFile);
+
+// The file names of the format descriptions that a registry lists, in its order; and the base name of the library that
+// a description names, empty when it names none. Texts are without surrounding white space. A file that is missing or
+// malformed throws the XML parser's own exception (toolkit/xml/xmlerror.h).
+KRV_DATASOURCES_API std::vector<std::string> ReadFormatRegistry(const std::string& path);
+KRV_DATASOURCES_API std::string ReadFormatObject(const std::string& path);
 
 // Reads the registry and registers the library of every format that it lists with the manager. The first failure ends
 // it and passes to the caller. Throws DataException when the registry lists nothing; a registry or description that is

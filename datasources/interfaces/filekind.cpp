@@ -17,6 +17,9 @@ struct Kind
     const char* pName;
 };
 
+constexpr char RSC[] = "a header of the kind .rsc, which is not read: write an ENVI header for the pixels beside it";
+constexpr char PAR[] = "a header of the kind .par, which is not read: write an ENVI header for the pixels beside it";
+
 constexpr Kind KINDS[] = {
     {0, "II*\0"sv, "a TIFF file, little-endian"},
     {0, "MM\0*"sv, "a TIFF file, big-endian"},
@@ -45,6 +48,12 @@ constexpr Kind KINDS[] = {
      "xz data: unpack it first"},
     {0, "\x28\xb5\x2f\xfd"sv, "zstd data: unpack it first"},
     {0, "%PDF"sv, "a PDF document"},
+    {0, "ncols "sv, "an ASCII grid (numbers as text), which is not read: convert it to a binary one (.flt with .hdr)"},
+    {0, "NCOLS "sv, "an ASCII grid (numbers as text), which is not read: convert it to a binary one (.flt with .hdr)"},
+    {0, "WIDTH "sv, RSC},
+    {0, "WIDTH\t"sv, RSC},
+    {0, "Gamma DIFF&GEO"sv, PAR},
+    {0, "Gamma Interferometric SAR Processor"sv, PAR},
     {0, "DEMO1\n"sv, "a DEMO file"},
     {0, "<?xml"sv, "an XML document"},
     {0, "<!DOCTYPE html"sv, "a web page: was the download redirected?"},

@@ -3,6 +3,7 @@
 #include "datasources/api.h"
 #include "datasources/interfaces/metadatamap.h"
 
+#include <map>
 #include <string>
 #include <vector>
 
@@ -20,7 +21,11 @@ class IRasterIO;
 // which pixels are valid. The validity mask of the image is the one of these with the lowest number; its set bits are
 // the valid pixels, and ValiditySource, levels, statistics and pictures honour it. A bitmap is made the validity mask
 // by SetBitmapDescription with an empty text, and made a zone again by any other text; CreateBitmap makes zones. A
-// format stores the two kinds so that other readers do not take a zone for validity.
+// format stores the two kinds so that other readers do not take a zone for validity. A zone whose metadata have the
+// number of a channel under VALIDITY_OF_CHANNEL says which pixels of that channel are valid; ValiditySource honours
+// these beside the mask of the image.
+inline constexpr char VALIDITY_OF_CHANNEL[] = "ValidityOfChannel";
+
 class KRV_DATASOURCES_API IBitmapDataset
 {
 public:
@@ -51,5 +56,7 @@ public:
 
 // The number of the validity mask; 0 when there is none.
 KRV_DATASOURCES_API unsigned int FindValidityMask(const IBitmapDataset& oBitmaps);
+// The bitmaps that say it of single channels, by the number of the channel; of several the one with the lowest number.
+KRV_DATASOURCES_API std::map<unsigned int, unsigned int> FindChannelMasks(const IBitmapDataset& oBitmaps);
 
 } // namespace krv::datasources

@@ -2,6 +2,7 @@
 // the rule that goes with an interface.
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/iblockencoding.h"
+#include "datasources/interfaces/iblocktransfer.h"
 #include "datasources/interfaces/ichannelfilter.h"
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
@@ -27,6 +28,7 @@
 #include "datasources/interfaces/isidecardataset.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/interfaces/iverifieddataset.h"
+#include "toolkit/core/numbertext.h"
 
 namespace krv::datasources
 {
@@ -34,6 +36,7 @@ namespace krv::datasources
 IBitmapDataset::~IBitmapDataset() = default;
 IBlockEncoder::~IBlockEncoder() = default;
 IBlockEncoding::~IBlockEncoding() = default;
+IBlockTransfer::~IBlockTransfer() = default;
 IChannelFilter::~IChannelFilter() = default;
 IChannelInfo::~IChannelInfo() = default;
 IDataset::~IDataset() = default;
@@ -58,6 +61,7 @@ IPlaceRemoval::~IPlaceRemoval() = default;
 IRasterDataset::~IRasterDataset() = default;
 IRasterIO::~IRasterIO() = default;
 ISidecarDataset::~ISidecarDataset() = default;
+ISidecarWriting::~ISidecarWriting() = default;
 IStorageDataset::~IStorageDataset() = default;
 IVerifiedDataset::~IVerifiedDataset() = default;
 
@@ -67,6 +71,20 @@ unsigned int FindValidityMask(const IBitmapDataset& oBitmaps)
         if (oBitmaps.GetBitmapDescription(nBitmap).empty())
             return nBitmap;
     return 0;
+}
+
+std::map<unsigned int, unsigned int> FindChannelMasks(const IBitmapDataset& oBitmaps)
+{
+    std::map<unsigned int, unsigned int> oMasks;
+    for (const unsigned int nBitmap : oBitmaps.GetBitmapList())
+    {
+        const MetadataMap oTags = oBitmaps.GetBitmapMetadata(nBitmap);
+        const auto oFound = oTags.find(VALIDITY_OF_CHANNEL);
+        const auto oChannel = oFound == oTags.end() ? std::nullopt : ParseNumber<unsigned int>(oFound->second);
+        if (oChannel && !oBitmaps.GetBitmapDescription(nBitmap).empty())
+            oMasks.emplace(*oChannel, nBitmap);
+    }
+    return oMasks;
 }
 
 } // namespace krv::datasources

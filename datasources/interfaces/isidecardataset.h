@@ -5,8 +5,16 @@
 #include <string>
 #include <vector>
 
+namespace krv::ogc::cs
+{
+class GeocodingInfo;
+class ICRS;
+} // namespace krv::ogc::cs
+
 namespace krv::datasources
 {
+
+class AuxiliaryData;
 
 // A file beside a dataset's own that says more of the image.
 struct Sidecar
@@ -26,6 +34,22 @@ public:
     // Looks for all of them, those that nobody asked for included. One that the file itself makes superfluous is there
     // without a trouble and is not used.
     virtual std::vector<Sidecar> ListSidecars() = 0;
+};
+
+// A dataset whose file is only read, and that can keep beside it what its format has no place for, or what the file
+// does not say. The order of the virtual operations is public and fixed.
+class KRV_DATASOURCES_API ISidecarWriting
+{
+public:
+    virtual ~ISidecarWriting();
+
+    // From now on the operations below, and masks and sensor models where they lie beside the file, change what lies
+    // beside; Synchronize and Close store it. All of these throw DataException for what the file itself says otherwise.
+    virtual void BeginSidecars() = 0;
+    // The whole record, as the dataset is to answer it.
+    virtual void WriteTagsBeside(const AuxiliaryData& oData) = 0;
+    virtual void WriteCRSBeside(const krv::ogc::cs::ICRS& oCRS) = 0;
+    virtual void WriteGeocodingBeside(const krv::ogc::cs::GeocodingInfo& oInfo) = 0;
 };
 
 } // namespace krv::datasources

@@ -4,13 +4,13 @@
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/ifileformat.h"
 #include "datasources/interfaces/ifileiobuilder.h"
+#include "datasources/iomanager/detail/xmlsupport.h"
 #include "datasources/iomanager/formatcapabilities.h"
 #include "toolkit/core/core.h"
 #include "toolkit/core/lettercase.h"
 #include "toolkit/exceptions/described.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
-#include "toolkit/xml/xmlutil.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -22,6 +22,7 @@
 #include <cstdio>
 #include <cstring>
 #include <mutex>
+#include <utility>
 
 namespace krv::datasources
 {
@@ -37,8 +38,8 @@ using Header = std::array<unsigned char, HEADER_LENGTH>;
 
 // Set while the instance is made, so that a format library that asks for it meanwhile is told instead of recursing.
 bool sbConstructing = false;
-// XML support was started for an instance that could not be made. It stays started for the next attempt, since the
-// exception that tells why may be one of the XML library's.
+// XML support was started for an instance that is not there: for the one being made, or one that could not be made. It
+// stays started for the next attempt, since the exception that tells why may be one of the XML library's.
 bool sbXmlPending = false;
 
 struct ConstructingGuard
@@ -117,7 +118,7 @@ struct DatasetManager::Shared
         moSecondary.clear();
         moCapabilities.clear();
         if (mbHoldsXml)
-            KRV_XMLUtil::Terminate();
+            detail::LoadXmlSupport().mpTerminate();
     }
 
     std::vector<std::unique_ptr<IFileIOBuilder>> moPrimary;
@@ -139,15 +140,17 @@ DatasetManager* DatasetManager::GetInstance()
     if (sbConstructing)
         throw krv::DataException("The dataset manager is being made: a format library must not ask for it while it "
                                  "registers");
-    if (!sbXmlPending)
-        KRV_XMLUtil::Initialize();
-    sbXmlPending = true;
+    // Others need no XML support of this library's.
+    if (!sbXmlPending && detail::HasXerces())
+    {
+        detail::LoadXmlSupport().mpInitialize();
+        sbXmlPending = true;
+    }
     {
         const ConstructingGuard oGuard;
         mpoManager = new DatasetManager();
     }
-    mpoManager->mpoShared->mbHoldsXml = true;
-    sbXmlPending = false;
+    mpoManager->mpoShared->mbHoldsXml = std::exchange(sbXmlPending, false);
     _IMPAtExit(&DatasetManager::DestroyInstance, SOURCE_FILE, 128);
     return mpoManager;
 }

@@ -1,17 +1,13 @@
 #include "datasources/iomanager/formatcapabilities.h"
 
-#include "datasources/iomanager/xalanselect.h"
+#include "datasources/iomanager/detail/xmlsupport.h"
 #include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/debugger.h"
-#include "toolkit/xml/xmldocument.h"
-#include "toolkit/xml/xmlerror.h"
-#include "toolkit/xml/xmlutil.h"
-
-#include <xalanc/PlatformSupport/XSLException.hpp>
-#include <xalanc/XalanDOM/XalanNode.hpp>
 
 #include <limits>
+#include <optional>
+#include <source_location>
 
 namespace krv::datasources
 {
@@ -21,8 +17,6 @@ namespace
 
 constexpr unsigned long long NO_LIMIT = std::numeric_limits<unsigned long long>::max();
 
-constexpr const char* UNKNOWN_ERROR = "An unknown error occur during the XPath evaluation"; // the wording is intended
-
 void Report(const std::string& message, std::source_location oLocation = std::source_location::current())
 {
     if (krv::nspio::Debugger::GetLevel() != 0)
@@ -30,37 +24,23 @@ void Report(const std::string& message, std::source_location oLocation = std::so
                                     oLocation.line());
 }
 
-// Asks a question of the parsed description; any failure is reported as debug output and answers `oOtherwise`.
-template <typename Answer, typename Question>
-Answer Ask(const std::string& xmlPath, const std::string& xpath, Answer oOtherwise, Question oQuestion)
+// The text of the node that the XPath finds in the description; any failure is reported as debug output and finds none.
+std::optional<std::string> Find(const std::string& xmlPath, const std::string& xpath)
 {
     try
     {
-        const krv::xml::Document oDocument = krv::xml::ParseFile(xmlPath);
-        return oQuestion(SelectSingleNode(xpath, oDocument.Get()));
-    }
-    catch (const xalanc::XSLException& oException)
-    {
-        Report(XmlTranscode(oException.getMessage().c_str()));
+        std::string text;
+        std::string problem;
+        if (detail::LoadXmlSupport().mpSelectText(xmlPath, xpath, text, problem))
+            return text;
+        if (!problem.empty())
+            Report(problem);
     }
     catch (const std::exception& oException)
     {
-        // The XML parser's own exception has no words here, intended, whatever else it is.
-        Report(krv::xml::IsParseException(oException) ? UNKNOWN_ERROR : oException.what());
+        Report(oException.what());
     }
-    catch (...)
-    {
-        Report(UNKNOWN_ERROR);
-    }
-    return oOtherwise;
-}
-
-unsigned long long ParseLimit(const std::string& text)
-{
-    const auto oLimit = krv::ParseNumber<unsigned long long>(text);
-    if (!oLimit)
-        throw krv::DataException("The limit is not a number: " + text);
-    return *oLimit;
+    return std::nullopt;
 }
 
 } // namespace
@@ -87,14 +67,16 @@ void FormatCapabilities::Copy(const FormatCapabilities& oOther)
 
 bool FormatCapabilities::IsSupported(const std::string& xpath) const
 {
-    return Ask(moXmlPath, xpath, false, [](const xalanc::XalanNode* poNode) { return poNode != nullptr; });
+    return Find(moXmlPath, xpath).has_value();
 }
 
 unsigned long long FormatCapabilities::GetLimit(const std::string& xpath) const
 {
-    return Ask(moXmlPath, xpath, NO_LIMIT,
-               [](const xalanc::XalanNode* poNode)
-               { return poNode == nullptr ? NO_LIMIT : ParseLimit(GetNodeText(*poNode)); });
+    const std::optional<std::string> text = Find(moXmlPath, xpath);
+    const auto oLimit = text ? krv::ParseNumber<unsigned long long>(*text) : std::optional(NO_LIMIT);
+    if (!oLimit)
+        Report("The limit is not a number: " + *text);
+    return oLimit.value_or(NO_LIMIT);
 }
 
 } // namespace krv::datasources

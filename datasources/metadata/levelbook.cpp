@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <charconv>
+#include <cstdint>
 
 namespace krv::datasources
 {
@@ -121,6 +122,12 @@ std::string ParseLevelMethod(const std::string& name)
     for (int nMethod = 0; nMethod <= static_cast<int>(krv::gobs::Resampling::eMax); ++nMethod)
         bKnown = bKnown || upper == GetResamplingName(static_cast<krv::gobs::Resampling>(nMethod));
     return bKnown ? upper : std::string();
+}
+
+bool IsLevelSize(unsigned int nFull, unsigned int nReduced, unsigned int nLevel)
+{
+    const std::uint64_t nDown = nFull / nLevel, nSize = nReduced;
+    return nLevel == 1 ? nReduced == nFull : nSize != 0 && nSize <= nDown + 1 && nSize + 1 >= nDown;
 }
 
 } // namespace krv::datasources

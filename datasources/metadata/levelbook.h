@@ -37,6 +37,10 @@ KRV_DATASOURCES_API std::string GetLevelMethod(const AuxiliaryData& oBook, unsig
 // named.
 KRV_DATASOURCES_API void RenameForeignMethod(AuxiliaryData& oBook, const std::string& method);
 
+// Whether a level may have so many columns, or rows, when the image has nFull: programs differ in how they round. Level
+// 1 is the image.
+KRV_DATASOURCES_API bool IsLevelSize(unsigned int nFull, unsigned int nReduced, unsigned int nLevel);
+
 // The name of a method in capitals, given in any letter case; empty for one that overview managers do not know.
 KRV_DATASOURCES_API std::string ParseLevelMethod(const std::string& name);
 

@@ -65,6 +65,7 @@ struct Level
     std::unique_ptr<SplitWriter> mpoSplit;
     std::unique_ptr<IRasterIO> mpoMaskIO;
     std::unique_ptr<LevelTarget> mpoTarget;
+    std::vector<std::function<void()>> moStores; // of tiles that the window made whole
 };
 
 // A window of the image, when it was read.
@@ -96,6 +97,7 @@ private:
     void Line(std::function<void()> oWork, std::function<void()> oTake);
     std::vector<PixelBounds> ListWindows() const;
     static WindowPointer Read(IRasterReader& oReader, const SourceForm& oForm, const PixelBounds& oBounds);
+    void Reduce(const krv::gobs::SourceWindow& oWindow);
     void Take(const WindowPointer& poWindow, const PixelBounds& oBounds);
     void TakeAll(const std::vector<PixelBounds>& oWindows);
     void Ask() const;
@@ -152,6 +154,8 @@ bool OverviewBuilder::PrepareMask(unsigned int nFactor)
 {
     const std::vector<unsigned int> oExisting = mpoMaskManager->GetLevels();
     bool bThere = std::find(oExisting.begin(), oExisting.end(), nFactor) != oExisting.end();
+    if (bThere)
+        mpoMaskManager->SetValid(mnMask, nFactor, false);
     if (bThere && (mpoMaskManager->GetLevelWidth(nFactor) != LevelSize(moForm.mnWidth, nFactor) ||
                    mpoMaskManager->GetLevelHeight(nFactor) != LevelSize(moForm.mnHeight, nFactor)))
     {
@@ -160,8 +164,6 @@ bool OverviewBuilder::PrepareMask(unsigned int nFactor)
     }
     if (!bThere)
         mpoMaskManager->CreateLevel(nFactor);
-    else
-        mpoMaskManager->SetValid(mnMask, nFactor, false);
     return bThere;
 }
 
@@ -190,6 +192,8 @@ void OverviewBuilder::Prepare(const std::vector<unsigned int>& oFactors)
         oLevel.mbWhole = std::find(oExisting.begin(), oExisting.end(), nFactor) == oExisting.end();
         if (!oLevel.mbWhole)
         {
+            // Before all else: what lies in another file becomes this one's then.
+            mpoAccessor->SetLevelValid(nFactor, false);
             oLevel.mpoWriter.reset(mpoAccessor->CreateRasterWriter(nFactor));
             if (oLevel.mpoWriter->GetWidth() != nWidth || oLevel.mpoWriter->GetHeight() != nHeight)
             {
@@ -200,8 +204,6 @@ void OverviewBuilder::Prepare(const std::vector<unsigned int>& oFactors)
         }
         if (oLevel.mbWhole)
             mpoAccessor->CreateLevel(nFactor);
-        else
-            mpoAccessor->SetLevelValid(nFactor, false);
         if (mnMask != 0 && !PrepareMask(nFactor))
             oLevel.mbWhole = true;
         oLevel.moBounds = oLevel.mbWhole ? PixelBounds{0, 0, nWidth, nHeight} : GetChanged(nFactor);
@@ -245,21 +247,22 @@ std::unique_ptr<LevelTarget> OverviewBuilder::MakeTarget(Level& oLevel)
     SplitWriter& oSplit = *oLevel.mpoSplit;
     auto oTarget = std::make_unique<LevelTarget>(
         TileGatherer(oLevel.moBounds, oWriter.GetTileWidth(), oWriter.GetTileHeight(), moForm.mnChannels, moForm.moType,
-                     [this, &oSplit](std::unique_ptr<Raster> poTile) { StoreTile(oSplit, std::move(poTile)); }),
+                     [this, &oLevel, &oSplit](const std::shared_ptr<const Raster>& poTile)
+                     { oLevel.moStores.push_back([this, &oSplit, poTile] { StoreTile(oSplit, poTile); }); }),
         moForm, mpoFinisher.get());
     if (mnMask == 0)
         return oTarget;
     oLevel.mpoMaskIO.reset(mpoMaskManager->GetOverviewIO(oLevel.mnFactor, {mnMask}));
     IRasterIO& oIO = *oLevel.mpoMaskIO;
     // In their turn among the tiles of pixels.
-    const auto Store = [this, &oIO](const std::shared_ptr<Raster>& poTile)
+    const auto Store = [this, &oLevel, &oIO](const std::shared_ptr<Raster>& poTile)
     {
         const auto Write = [&oIO, poTile]
         {
             oIO.WriteWindow(static_cast<unsigned int>(poTile->GetX()), static_cast<unsigned int>(poTile->GetY()),
                             poTile->GetWidth(), poTile->GetHeight(), poTile->GetBuffer());
         };
-        Line([] {}, Write);
+        oLevel.moStores.push_back([this, Write] { Line([] {}, Write); });
     };
     oTarget->SetMask(std::make_unique<TileGatherer>(oLevel.moBounds, oIO.GetTileWidth(), oIO.GetTileHeight(), 1,
                                                     krv::gobs::eDT_8U, Store));
@@ -365,16 +368,30 @@ WindowPointer OverviewBuilder::Read(IRasterReader& oReader, const SourceForm& oF
     return poWindow;
 }
 
+// Levels that do not come from one another are made side by side. What they make whole is stored afterwards, so that
+// its order does not depend on the threads.
+void OverviewBuilder::Reduce(const krv::gobs::SourceWindow& oWindow)
+{
+    if (moReducers.size() == 1)
+        return moReducers.front()->Add(oWindow);
+    krv::threading::TaskLine oLine(moThreads);
+    for (const auto& poReducer : moReducers)
+        oLine.Add([&oWindow, &oReducer = *poReducer] { oReducer.Add(oWindow); }, {});
+    oLine.TakeAll();
+}
+
 void OverviewBuilder::Take(const WindowPointer& poWindow, const PixelBounds& oBounds)
 {
     const unsigned char* const pValid = moForm.mbValidity ? moValidity.Mark(*poWindow) : nullptr;
-    for (const auto& oReducer : moReducers)
-        oReducer->Add({oBounds, poWindow->GetBuffer(), pValid, moValidity.GetRows()});
+    Reduce({oBounds, poWindow->GetBuffer(), pValid, moValidity.GetRows()});
+    for (Level& oLevel : moLevels)
+        for (const auto& oStore : std::exchange(oLevel.moStores, {}))
+            oStore();
     mnDone += std::uint64_t{oBounds.GetWidth()} * oBounds.GetHeight();
     Ask();
 }
 
-// Windows are read by all threads, and reduced by this one in their order.
+// Windows are read by all threads, and reduced in their order.
 void OverviewBuilder::TakeAll(const std::vector<PixelBounds>& oWindows)
 {
     using Reader = std::shared_ptr<IRasterReader>;

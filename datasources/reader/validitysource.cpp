@@ -6,6 +6,7 @@
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/metadata/typednodata.h"
 #include "datasources/reader/basicreader.h"
+#include "datasources/reader/detail/bitmapbackground.h"
 #include "datasources/reader/detail/rasterchannels.h"
 #include "datasources/reader/detail/reducedvalidity.h"
 #include "gobs/mask/exactmaskdecision.h"
@@ -13,6 +14,8 @@
 #include "gobs/raster/raster.h"
 
 #include <algorithm>
+#include <map>
+#include <utility>
 
 namespace krv::datasources
 {
@@ -27,16 +30,8 @@ using krv::gobs::Mask;
 using krv::gobs::MaskDecisionBuilder;
 using krv::gobs::Raster;
 
+using detail::BitmapBackground;
 using detail::ZeroOrNaN;
-
-// Marks what an extra channel over the region of the raster says to be background.
-std::unique_ptr<Mask> ReadBackground(BasicReader& oReader, const Raster& oRegion)
-{
-    const krv::gobs::RasterInfo oInfo(oRegion.GetWidth(), oRegion.GetHeight(), 1, oReader.GetDataType());
-    Raster oRaster(oInfo, oRegion.GetContext());
-    oReader.ReadRaster(&oRaster);
-    return std::unique_ptr<Mask>(ZeroOrNaN(1)->BuildMask(oRaster));
-}
 
 void Add(Mask& oBackground, const Mask& oOther)
 {
@@ -44,6 +39,14 @@ void Add(Mask& oBackground, const Mask& oOther)
     const unsigned char* const pOther = oOther.GetBits();
     for (std::uint64_t n = 0; n < oBackground.GetBitsSize(); ++n)
         pBits[n] |= pOther[n];
+}
+
+void KeepCommon(Mask& oBackground, const Mask& oOther)
+{
+    unsigned char* const pBits = oBackground.GetBits();
+    const unsigned char* const pOther = oOther.GetBits();
+    for (std::uint64_t n = 0; n < oBackground.GetBitsSize(); ++n)
+        pBits[n] &= pOther[n];
 }
 
 void AddOutside(Mask& oBackground, unsigned int nImageWidth, unsigned int nImageHeight)
@@ -133,12 +136,22 @@ void ValiditySource::FindAll(IDataset& oDataset, const AuxiliaryData& oRecord,
         oChannels.empty() ? detail::FirstChannels(oRecord.GetChannelCount()) : oChannels;
     const unsigned int nAlpha = FindAlpha(oRecord);
     FindNoData(oRecord, bNoData ? oListed : std::vector<unsigned int>(), nAlpha, eRule);
-    FindBitmap(oDataset);
+    meRule = eRule;
+    FindBitmap(oDataset, oListed);
     const auto oAlpha = std::find(oListed.begin(), oListed.end(), nAlpha);
     if (nAlpha != 0 && oAlpha != oListed.end())
         UseAlphaOfRaster(static_cast<unsigned int>(oAlpha - oListed.begin()) + 1);
     else if (nAlpha != 0)
-        mpoAlphaReader = std::make_unique<BasicReader>(&oDataset, std::vector<unsigned int>{nAlpha}, false);
+        mpoAlpha = std::make_unique<BitmapBackground>(
+            std::make_unique<BasicReader>(&oDataset, std::vector<unsigned int>{nAlpha}, false));
+    for (std::size_t n = 0; n < moChannels.size(); ++n)
+    {
+        const auto oValue = bNoData ? GetTypedNoData(oRecord, oListed[n]) : std::nullopt;
+        if (!oValue || oListed[n] == nAlpha)
+            continue;
+        const ExactMaskDecision oDecision(krv::gobs::eAnyChannel, {*oValue}, {static_cast<unsigned int>(n) + 1});
+        moChannels[n].mpoNoData = std::make_unique<MaskDecisionBuilder>(&oDecision);
+    }
 }
 
 ValiditySource::ValiditySource(IDataset* poDataset, const std::vector<unsigned int>& oChannels, unsigned int nWidth,
@@ -180,31 +193,57 @@ void ValiditySource::FindNoData(const AuxiliaryData& oMetadata, const std::vecto
     mpoNoData = std::make_unique<MaskDecisionBuilder>(&oDecision);
 }
 
-void ValiditySource::FindBitmap(IDataset& oDataset)
+void ValiditySource::FindBitmap(IDataset& oDataset, const std::vector<unsigned int>& oChannels)
 {
     auto* const poBitmaps = dynamic_cast<IBitmapDataset*>(&oDataset);
     if (poBitmaps == nullptr)
         return;
+    const auto Read = [&](unsigned int nBitmap)
+    {
+        auto poReader = std::make_unique<BasicReader>(poBitmaps, std::vector<unsigned int>{nBitmap}, false);
+        if (poReader->GetWidth() != mnImageWidth || poReader->GetHeight() != mnImageHeight)
+            throw krv::DataException("Bitmap " + std::to_string(nBitmap) + " is not of the image's size");
+        return std::make_unique<BitmapBackground>(std::move(poReader));
+    };
     mnBitmap = FindValidityMask(*poBitmaps);
-    if (mnBitmap == 0)
+    if (mnBitmap != 0)
+        mpoBitmap = Read(mnBitmap);
+    const std::map<unsigned int, unsigned int> oMasks = FindChannelMasks(*poBitmaps);
+    const auto HasMask = [&oMasks](unsigned int nChannel)
+    {
+        return oMasks.count(nChannel) != 0;
+    };
+    if (std::none_of(oChannels.begin(), oChannels.end(), HasMask))
         return;
-    mpoBitmapReader = std::make_unique<BasicReader>(poBitmaps, std::vector<unsigned int>{mnBitmap}, false);
-    if (mpoBitmapReader->GetWidth() != mnImageWidth || mpoBitmapReader->GetHeight() != mnImageHeight)
-        throw krv::DataException("Bitmap " + std::to_string(mnBitmap) + " is not of the image's size");
+    moChannels.resize(oChannels.size());
+    for (std::size_t n = 0; n < oChannels.size(); ++n)
+        if (HasMask(oChannels[n]))
+            moChannels[n].mpoMask = Read(oMasks.at(oChannels[n]));
+}
+
+std::vector<BitmapBackground*> ValiditySource::ListBeside() const
+{
+    std::vector<BitmapBackground*> oList = {mpoBitmap.get(), mpoAlpha.get()};
+    for (const Channel& oChannel : moChannels)
+        oList.push_back(oChannel.mpoMask.get());
+    std::erase(oList, nullptr);
+    return oList;
+}
+
+const IMaskBuilder* ValiditySource::GetChannelMask(std::size_t nPosition) const
+{
+    return nPosition < moChannels.size() ? moChannels[nPosition].mpoMask.get() : nullptr;
 }
 
 void ValiditySource::UseLevel(IDataset& oDataset, unsigned int nWidth, unsigned int nHeight)
 {
     std::unique_ptr<BasicReader> poStored;
-    if (mpoBitmapReader != nullptr)
+    if (mpoBitmap != nullptr)
         poStored = detail::ReadStoredLevel(oDataset, mnBitmap, nWidth, nHeight);
-    for (std::unique_ptr<BasicReader>* const poReader : {&mpoBitmapReader, &mpoAlphaReader})
-    {
-        if (*poReader != nullptr)
-            *poReader = detail::ReadReduced(oDataset, std::move(*poReader), nWidth, nHeight);
-    }
+    for (BitmapBackground* const poBeside : ListBeside())
+        poBeside->SetReader(detail::ReadReduced(oDataset, poBeside->TakeReader(), nWidth, nHeight));
     if (poStored != nullptr)
-        mpoBitmapReader = std::move(poStored);
+        mpoBitmap->SetReader(std::move(poStored));
     mnImageWidth = nWidth;
     mnImageHeight = nHeight;
 }
@@ -220,23 +259,38 @@ void ValiditySource::SetMarginBehaviour(eMarginBehaviour eBehaviour)
     meBehaviour = eBehaviour;
     // What is read beside the raster is not valid outside the image when the raster's margins are not copies.
     const eMarginBehaviour eRead = CopiesPixels(eBehaviour) ? eBehaviour : eConstant;
-    for (BasicReader* poReader : {mpoBitmapReader.get(), mpoAlphaReader.get()})
+    for (const BitmapBackground* const poBeside : ListBeside())
+        poBeside->GetReader().SetMargins(0, 0, eRead);
+}
+
+std::unique_ptr<Mask> ValiditySource::CombineChannels(const Raster& oRaster) const
+{
+    std::unique_ptr<Mask> poAll;
+    for (const Channel& oChannel : moChannels)
     {
-        if (poReader != nullptr)
-            poReader->SetMargins(0, 0, eRead);
+        std::unique_ptr<Mask> poOne(oChannel.mpoNoData != nullptr ? oChannel.mpoNoData->BuildMask(oRaster)
+                                                                  : new Mask(oRaster.GetInfo(), oRaster.GetContext()));
+        if (oChannel.mpoMask != nullptr)
+            Add(*poOne, *std::unique_ptr<Mask>(oChannel.mpoMask->BuildMask(oRaster)));
+        if (poAll == nullptr)
+            poAll = std::move(poOne);
+        else if (meRule == krv::gobs::eAllChannels)
+            KeepCommon(*poAll, *poOne);
+        else
+            Add(*poAll, *poOne);
     }
+    return poAll;
 }
 
 Mask* ValiditySource::BuildMask(const Raster& oRaster) const
 {
-    std::unique_ptr<Mask> oMask(mpoNoData->BuildMask(oRaster));
+    std::unique_ptr<Mask> oMask =
+        HasChannelMasks() ? CombineChannels(oRaster) : std::unique_ptr<Mask>(mpoNoData->BuildMask(oRaster));
     if (mpoAlphaOfRaster != nullptr)
         Add(*oMask, *std::unique_ptr<Mask>(mpoAlphaOfRaster->BuildMask(oRaster)));
-    for (BasicReader* poReader : {mpoBitmapReader.get(), mpoAlphaReader.get()})
-    {
-        if (poReader != nullptr)
-            Add(*oMask, *ReadBackground(*poReader, oRaster));
-    }
+    for (const BitmapBackground* const poBeside : {mpoBitmap.get(), mpoAlpha.get()})
+        if (poBeside != nullptr)
+            Add(*oMask, *std::unique_ptr<Mask>(poBeside->BuildMask(oRaster)));
     if (!CopiesPixels(meBehaviour) && ReachesOutside(*oMask, mnImageWidth, mnImageHeight))
         AddOutside(*oMask, mnImageWidth, mnImageHeight);
     Invert(*oMask);

@@ -6,6 +6,7 @@
 #include "gobs/raster/margins.h"
 #include "toolkit/exceptions/place.h"
 
+#include <cstddef>
 #include <memory>
 #include <vector>
 
@@ -17,6 +18,11 @@ class BasicReader;
 class IDataset;
 class IRasterReader;
 
+namespace detail
+{
+class BitmapBackground;
+}
+
 // The channel that says how opaque pixels are: the first one whose tag "ColorInterp" is "Alpha", in any letter case; 0
 // when there is none.
 KRV_DATASOURCES_API unsigned int FindAlpha(const AuxiliaryData& oMetadata);
@@ -26,8 +32,10 @@ KRV_DATASOURCES_API unsigned int FindAlpha(const AuxiliaryData& oMetadata);
 // no-data builders a set bit is a valid pixel.
 //
 // No-data: the values of the channels, alpha aside, as GetTypedNoData reads them, combined by the rule. Mask bitmap:
-// the validity mask of IBitmapDataset; its set bits are valid. Alpha: the channel that FindAlpha names; values above 0
-// are valid. One thread at a time.
+// the validity mask of IBitmapDataset; its set bits are valid. Masks of single channels, as FindChannelMasks finds
+// them: a channel has no data where its own mask or its no-data value says so, one with neither has data everywhere,
+// and the rule combines all listed ones. Alpha: the channel that FindAlpha names; values above 0 are valid. One thread
+// at a time.
 class KRV_DATASOURCES_API ValiditySource : public krv::gobs::IMaskBuilder
 {
 public:
@@ -55,10 +63,14 @@ public:
 
     // Which sources there are; with none of them every pixel of the image is valid.
     bool HasNoData() const { return mbNoData; }
-    bool HasBitmap() const { return mpoBitmapReader != nullptr; }
-    bool HasAlpha() const { return mpoAlphaReader != nullptr || mnAlphaInRaster != 0; }
-    // The number of the mask bitmap; 0 when there is none.
+    bool HasBitmap() const { return mpoBitmap != nullptr || HasChannelMasks(); }
+    bool HasChannelMasks() const { return !moChannels.empty(); }
+    bool HasAlpha() const { return mpoAlpha != nullptr || mnAlphaInRaster != 0; }
+    // The number of the image's mask bitmap; 0 when there is none.
     unsigned int GetBitmap() const { return mnBitmap; }
+    // What marks the pixels that the mask of a channel alone says to be background, by its position in the rasters,
+    // from 0; null when it has no mask. It goes with this.
+    const krv::gobs::IMaskBuilder* GetChannelMask(std::size_t nPosition) const;
 
     // How the margins of the rasters were made; eMirror when nobody says. Behaviours that copy pixels copy their
     // validity; under the others pixels outside the image are not valid.
@@ -73,15 +85,25 @@ private:
                  krv::gobs::BkgdRule eRule, bool bNoData);
     void FindNoData(const AuxiliaryData& oMetadata, const std::vector<unsigned int>& oChannels, unsigned int nAlpha,
                     krv::gobs::BkgdRule eRule);
-    void FindBitmap(IDataset& oDataset);
+    void FindBitmap(IDataset& oDataset, const std::vector<unsigned int>& oChannels);
+    std::vector<detail::BitmapBackground*> ListBeside() const;
+    std::unique_ptr<krv::gobs::Mask> CombineChannels(const krv::gobs::Raster& oRaster) const;
     void UseAlphaOfRaster(unsigned int nPosition);
     void UseLevel(IDataset& oDataset, unsigned int nWidth, unsigned int nHeight);
 
     std::unique_ptr<const krv::gobs::IMaskBuilder> mpoNoData;
     std::unique_ptr<const krv::gobs::IMaskBuilder> mpoAlphaOfRaster;
-    // What they read is background where it is 0.
-    std::unique_ptr<BasicReader> mpoBitmapReader;
-    std::unique_ptr<BasicReader> mpoAlphaReader;
+    // Of one listed channel; both may be null.
+    struct Channel
+    {
+        std::unique_ptr<const krv::gobs::IMaskBuilder> mpoNoData;
+        std::unique_ptr<detail::BitmapBackground> mpoMask;
+    };
+
+    std::unique_ptr<detail::BitmapBackground> mpoBitmap;
+    std::unique_ptr<detail::BitmapBackground> mpoAlpha;
+    std::vector<Channel> moChannels; // none unless one of them has a mask
+    krv::gobs::BkgdRule meRule = krv::gobs::eAllChannels;
     unsigned int mnImageWidth;
     unsigned int mnImageHeight;
     unsigned int mnBitmap = 0;

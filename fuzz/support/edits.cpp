@@ -11,7 +11,6 @@
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/crsfactory.h"
-#include "toolkit/xml/xmlutil.h"
 
 #include <algorithm>
 #include <cstring>
@@ -669,6 +668,5 @@ void Edits::Run(TifPointer poDataset)
 extern "C" int LLVMFuzzerInitialize(int*, char***)
 {
     krv::nspio::Warning::SetSink([](const std::string&, const std::string&, unsigned int) {});
-    KRV_XMLUtil::Initialize(); // else every reading of tag 42112 starts it anew
     return 0;
 }

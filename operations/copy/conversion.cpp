@@ -31,6 +31,7 @@
 #include <algorithm>
 #include <filesystem>
 #include <memory>
+#include <optional>
 #include <system_error>
 
 namespace krv::operations
@@ -159,14 +160,32 @@ void CopyChannels(const CopyPlan& oPlan, const Target& oTarget)
     }
 }
 
-unsigned int CopyBitmap(const SourceFile& oSource, unsigned int nFrom, const Target& oTarget,
+// The tags of a bitmap of the first file; one that belongs to a channel follows it to its new number. No value when
+// the channel is not copied.
+std::optional<MetadataMap> FindBitmapTags(const CopyPlan& oPlan, const IBitmapDataset& oFrom, unsigned int nBitmap)
+{
+    MetadataMap oTags = oFrom.GetBitmapMetadata(nBitmap);
+    const auto oOwner = oTags.find(krv::datasources::VALIDITY_OF_CHANNEL);
+    if (oOwner == oTags.end())
+        return oTags;
+    for (std::size_t i = 0; i < oPlan.GetChannels().size(); ++i)
+    {
+        const CopiedChannel& oChannel = oPlan.GetChannels()[i];
+        if (oChannel.source != 0 || std::to_string(oChannel.channel) != oOwner->second)
+            continue;
+        oOwner->second = std::to_string(i + 1);
+        return oTags;
+    }
+    return std::nullopt;
+}
+
+unsigned int CopyBitmap(const SourceFile& oSource, unsigned int nFrom, const MetadataMap& oTags, const Target& oTarget,
                         const PixelWindow& oWindow)
 {
     const auto& oFrom = dynamic_cast<const IBitmapDataset&>(oSource.GetDataset());
     IBitmapDataset& oTo = *oTarget.Find<IBitmapDataset>();
     const unsigned int nTo = oTo.CreateBitmap();
     oTo.SetBitmapDescription(nTo, oFrom.GetBitmapDescription(nFrom));
-    const MetadataMap oTags = oFrom.GetBitmapMetadata(nFrom);
     if (!oTags.empty())
         oTo.SetBitmapMetadata(nTo, oTags);
     const auto Open = [nFrom](const SourceFile& oFile)
@@ -200,8 +219,12 @@ BitmapNumbers CopyBitmaps(const CopyPlan& oPlan, const Target& oTarget)
             continue;
         }
         for (const unsigned int nBitmap : oList)
-            oTarget.Try(Of(oPlan, s, fmt::format("bitmap {}", nBitmap)), [&]
-                        { oNumbers[nBitmap] = CopyBitmap(oPlan.GetSource(s), nBitmap, oTarget, oPlan.GetWindow()); });
+            if (const auto oTags = FindBitmapTags(oPlan, *poFrom, nBitmap))
+                oTarget.Try(Of(oPlan, s, fmt::format("bitmap {}", nBitmap)),
+                            [&] {
+                                oNumbers[nBitmap] =
+                                    CopyBitmap(oPlan.GetSource(s), nBitmap, *oTags, oTarget, oPlan.GetWindow());
+                            });
     }
     return oNumbers;
 }

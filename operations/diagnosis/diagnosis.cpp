@@ -26,7 +26,6 @@
 #include "toolkit/mathmodel/imathmodel.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/icrs.h"
-#include "toolkit/xml/xmltree.h"
 
 #include <fmt/format.h>
 
@@ -35,7 +34,6 @@
 #include <filesystem>
 #include <fstream>
 #include <functional>
-#include <iterator>
 
 namespace krv::operations
 {
@@ -46,20 +44,6 @@ namespace
 {
 
 constexpr std::size_t HEADER_BYTES = 4096;
-
-std::string ReadAll(const std::string& path)
-{
-    std::ifstream oStream(path, std::ios::binary);
-    return {std::istreambuf_iterator<char>(oStream), std::istreambuf_iterator<char>()};
-}
-
-std::string Trim(const std::string& text)
-{
-    constexpr char BLANKS[] = " \t\r\n";
-    const auto nFirst = text.find_first_not_of(BLANKS);
-    return nFirst == std::string::npos ? std::string()
-                                       : text.substr(nFirst, text.find_last_not_of(BLANKS) - nFirst + 1);
-}
 
 } // namespace
 
@@ -103,13 +87,7 @@ void InstallationCheck::CheckRegistry()
     std::vector<std::string> oDescriptions;
     try
     {
-        const std::string text = ReadAll(path);
-        const krv::xml::Element oRoot = krv::xml::ParseTree(text.data(), text.size(), path);
-        for (const krv::xml::Element& oChild : oRoot.children)
-        {
-            if (oRoot.name == "Formats" && oChild.name == "Format")
-                oDescriptions.push_back(Trim(oChild.text));
-        }
+        oDescriptions = ReadFormatRegistry(path);
     }
     catch (...)
     {
@@ -134,13 +112,11 @@ void InstallationCheck::CheckDescription(const std::string& description)
         return Bad(subject, path + ": " + why, "reinstall the plug-in, or take the entry out of the registry");
     try
     {
-        const std::string text = ReadAll(path);
-        const krv::xml::Element oRoot = krv::xml::ParseTree(text.data(), text.size(), path);
-        const krv::xml::Element* const poObject = oRoot.name == "Format" ? oRoot.FindChild("Object") : nullptr;
-        if (poObject == nullptr || Trim(poObject->text).empty())
+        const std::string object = ReadFormatObject(path);
+        if (object.empty())
             return Bad(subject, "names no library", "add <Object>name</Object> to <Format>, or reinstall the plug-in");
-        Good(subject, "names the library " + GetFormatLibraryFilename(Trim(poObject->text), "so"));
-        CheckPlugin(Trim(poObject->text));
+        Good(subject, "names the library " + GetFormatLibraryFilename(object, "so"));
+        CheckPlugin(object);
     }
     catch (...)
     {
@@ -400,6 +376,27 @@ void AskPlugin(const std::string& file, const LoadedPlugin& oPlugin, const Heade
 
 } // namespace
 
+std::string DescribeUnknown(const std::string& file)
+{
+    Header oHeader{};
+    const std::string kind = GuessFileKind(oHeader.data(), ReadHeader(file, oHeader));
+    if (!kind.empty())
+        return "it begins like " + kind;
+    const std::filesystem::path oPath(file);
+    for (const std::string& header :
+         {file + ".rsc", file + ".par", (oPath.parent_path() / oPath.stem()).string() + ".par",
+          (oPath.parent_path() / oPath.stem()).string() + "_dem.par"})
+    {
+        std::error_code oNone;
+        if (std::filesystem::is_regular_file(header, oNone))
+            return fmt::format(
+                "the header {} beside it is of a kind that is not read: write an ENVI header {}.hdr with "
+                "its size and data type",
+                header, file);
+    }
+    return {};
+}
+
 std::vector<Finding> CheckFile(const std::string& file, const std::vector<LoadedPlugin>& oPlugins)
 {
     const std::string why = WhyUnreadable(file);
@@ -418,7 +415,9 @@ std::vector<Finding> CheckFile(const std::string& file, const std::vector<Loaded
     bool bRecognised = false;
     for (const LoadedPlugin& oPlugin : oPlugins)
         AskPlugin(file, oPlugin, oHeader, bRecognised, oFindings);
-    if (!bRecognised)
+    if (const std::string cause = bRecognised ? std::string() : DescribeUnknown(file); !cause.empty())
+        oFindings.push_back({false, "file " + file, "no format recognises it: " + cause, {}});
+    else if (!bRecognised)
         oFindings.push_back({false, "file " + file, "no format recognises it",
                              "install the plug-in of its format, or convert it to one that `krv formats` lists"});
     return oFindings;

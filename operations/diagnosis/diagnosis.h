@@ -56,6 +56,9 @@ private:
     std::vector<LoadedPlugin> moPlugins;
 };
 
+// What a file seems to be that no format recognises, and what to do about it; empty when nothing says so.
+KRV_OPERATIONS_API std::string DescribeUnknown(const std::string& file);
+
 // Why a file opens or does not: the file itself, which plug-ins were asked, what each said, and what its opening gave.
 KRV_OPERATIONS_API std::vector<Finding> CheckFile(const std::string& file, const std::vector<LoadedPlugin>& oPlugins);
 

@@ -1,7 +1,5 @@
 #include "operations/job/exceptions.h"
 
-#include "toolkit/xml/xmlerror.h"
-
 namespace krv::operations
 {
 
@@ -28,7 +26,7 @@ std::string CurrentMessage()
     }
     catch (...)
     {
-        return krv::xml::DescribeCurrentException();
+        return "unknown error";
     }
 }
 

@@ -150,7 +150,10 @@ DisplayChoice ChooseDisplay(const SourceFile& oFile, const std::vector<unsigned 
         oChoice.inverted = krv::ToUpper(oFile.GetMetadata().GetFileMetadataValue("PHOTOMETRIC")) == "MINISWHITE";
     }
     if (const auto* const poBitmaps = dynamic_cast<krv::datasources::IBitmapDataset*>(&oFile.GetDataset()))
+    {
         oChoice.maskBitmap = krv::datasources::FindValidityMask(*poBitmaps);
+        oChoice.channelMasks = krv::datasources::FindChannelMasks(*poBitmaps);
+    }
     return oChoice;
 }
 

@@ -3,6 +3,7 @@
 #include "gobs/pct/pct.h"
 #include "operations/api.h"
 
+#include <map>
 #include <memory>
 #include <vector>
 
@@ -34,6 +35,7 @@ struct DisplayChoice
     bool premultiplied = false;            // colours are multiplied by their opacity
     float inkFull = 255;                   // the value of an ink that covers fully
     unsigned int maskBitmap = 0;           // bitmap whose set bits are valid pixels; 0: none
+    std::map<unsigned int, unsigned int> channelMasks; // the same of single channels, by their numbers
     DisplayReason reason = DisplayReason::eFirst;
 };
 

@@ -98,10 +98,11 @@ std::vector<Plane> ReadColours(const SourceFile& oFile, const DisplayChoice& oCh
                   oCounter, oThreads.executor);
 }
 
-void Multiply(std::vector<float>& oOpacity, const Plane& oPlane, float nFull)
+// By what a plane says, 0 to nFull.
+void Multiply(std::vector<float>& oShares, const Plane& oPlane, float nFull)
 {
-    for (std::size_t i = 0; i < oOpacity.size(); ++i)
-        oOpacity[i] *= std::clamp(oPlane.values[i] / nFull, 0.0F, 1.0F);
+    for (std::size_t i = 0; i < oShares.size(); ++i)
+        oShares[i] *= std::clamp(oPlane.values[i] / nFull, 0.0F, 1.0F);
 }
 
 // Alpha that never exceeds 255 is meant in 8 bits, whatever the channel's type.
@@ -135,7 +136,7 @@ LevelReader ReadBitmap(const SourceFile& oFile, unsigned int nBitmap)
 }
 
 // The bits are read at full size: levels of bitmaps are not always there.
-void ApplyMask(const SourceFile& oFile, unsigned int nBitmap, const Size& oSize, std::vector<float>& oOpacity,
+void ApplyMask(const SourceFile& oFile, unsigned int nBitmap, const Size& oSize, std::vector<float>& oShares,
                const Threads& oThreads)
 {
     const auto Read = [nBitmap](const SourceFile& oSource)
@@ -145,7 +146,7 @@ void ApplyMask(const SourceFile& oFile, unsigned int nBitmap, const Size& oSize,
     ProgressCounter oCounter(oThreads.progress, "mask", ReaderBytes(Read(oFile).Get()));
     const auto oPlanes = Reduce(oFile, Read, {std::nullopt}, oSize.width, oSize.height, Resampling::eAverage, oCounter,
                                 oThreads.executor);
-    Multiply(oOpacity, oPlanes.front(), 1.0F);
+    Multiply(oShares, oPlanes.front(), 1.0F);
 }
 
 // Pixels that will not be seen take no part in the stretch.
@@ -163,6 +164,9 @@ void HideTransparent(std::vector<Plane>& oPlanes, const std::vector<float>& oOpa
 std::vector<float> FindOpacity(const SourceFile& oFile, const DisplayChoice& oChoice, const Size& oSize,
                                std::vector<Plane>& oPlanes, const Threads& oThreads)
 {
+    for (std::size_t c = 0; c < oPlanes.size(); ++c)
+        if (const auto oMask = oChoice.channelMasks.find(oChoice.channels[c]); oMask != oChoice.channelMasks.end())
+            ApplyMask(oFile, oMask->second, oSize, oPlanes[c].coverage, oThreads);
     std::vector<float> oOpacity(oPlanes.front().coverage.size(), 0.0F);
     for (const Plane& oPlane : oPlanes)
     {

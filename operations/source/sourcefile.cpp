@@ -34,10 +34,22 @@ namespace
 
 constexpr char NO_DATA[] = "NO_DATA_VALUE";
 
+// A file whose format does not update files is updated by what lies beside it.
 std::unique_ptr<krv::datasources::IDataset> OpenDataset(const std::string& name, AccessMode eMode)
 {
-    std::unique_ptr<krv::datasources::IDataset> poDataset(
-        krv::datasources::DatasetManager::GetInstance()->Open(name, eMode));
+    auto* const poManager = krv::datasources::DatasetManager::GetInstance();
+    std::unique_ptr<krv::datasources::IDataset> poDataset;
+    try
+    {
+        poDataset.reset(poManager->Open(name, eMode));
+    }
+    catch (const krv::DataException&)
+    {
+        if (eMode == eUpdate)
+            poDataset.reset(poManager->OpenFormat("GDBALL", name, eMode));
+        if (poDataset == nullptr)
+            throw;
+    }
     if (poDataset == nullptr)
         throw krv::FileFormatException(name, "its format recognised it and then opened nothing");
     return poDataset;

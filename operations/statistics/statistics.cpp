@@ -495,6 +495,18 @@ struct TileStatistics
     std::uint64_t bytes;
 };
 
+// The pixels that are valid but for those that the mask of one channel excludes.
+std::unique_ptr<krv::gobs::Mask> WithoutBackground(const krv::gobs::Mask& oValid,
+                                                   const krv::gobs::IMaskBuilder& oChannelMask,
+                                                   const krv::gobs::Raster& oTile)
+{
+    std::unique_ptr<krv::gobs::Mask> poMask(oChannelMask.BuildMask(oTile));
+    std::transform(poMask->GetBits(), poMask->GetBits() + poMask->GetBitsSize(), oValid.GetBits(), poMask->GetBits(),
+                   [](unsigned char nBackground, unsigned char nValid)
+                   { return static_cast<unsigned char>(nValid & ~nBackground); });
+    return poMask;
+}
+
 TileStatistics Gather(const Worker& oWorker, std::uint64_t nTile, const std::vector<Gathering>& oHow)
 {
     const std::unique_ptr<krv::gobs::Raster> poTile(oWorker.reader.Get().GetRaster(static_cast<unsigned int>(nTile)));
@@ -508,8 +520,13 @@ TileStatistics Gather(const Worker& oWorker, std::uint64_t nTile, const std::vec
     const unsigned char* const pOpaque = poOpaque != nullptr ? poOpaque->GetBits() : nullptr;
     TileStatistics oResult{MakeGatherers(poTile->GetDataType(), oHow), poTile->GetBufferSize()};
     for (std::size_t c = 0; c < oHow.size(); ++c)
-        oResult.channels[c]->Add(poTile->GetBuffer() + c * nValueBytes, nPixels, poTile->GetChansCount(), pValid,
-                                 pOpaque);
+    {
+        const krv::gobs::IMaskBuilder* const poOwn =
+            oWorker.validity != nullptr ? oWorker.validity->GetChannelMask(c) : nullptr;
+        const auto poChannel = poOwn != nullptr ? WithoutBackground(*poMask, *poOwn, *poTile) : nullptr;
+        oResult.channels[c]->Add(poTile->GetBuffer() + c * nValueBytes, nPixels, poTile->GetChansCount(),
+                                 poChannel != nullptr ? poChannel->GetBits() : pValid, pOpaque);
+    }
     return oResult;
 }
 

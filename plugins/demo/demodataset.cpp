@@ -17,7 +17,7 @@ static_assert(std::endian::native == std::endian::little, "values would have to 
 const support::HeadedFile::FirstLines DemoDataset::FIRST_LINES = {"DEMO1\n", "DEMO-\n"};
 
 DemoDataset::DemoDataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat)
-    : RecordDataset(fileName, poFormat),
+    : RecordDataset(fileName, poFormat), FacetsBeside(this),
       mpoFile(std::make_shared<support::HeadedFile>(
           std::make_shared<support::File>(fileName, support::File::Mode::eRead), FIRST_LINES))
 {
@@ -26,7 +26,7 @@ DemoDataset::DemoDataset(const std::string& fileName, krv::datasources::IFileFor
 }
 
 DemoDataset::DemoDataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<support::HeadedFile> poNew)
-    : RecordDataset(poFormat, poNew), mpoFile(std::move(poNew))
+    : RecordDataset(poFormat, poNew), FacetsBeside(this), mpoFile(std::move(poNew))
 {
 }
 

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "plugins/support/facetsbeside.h"
 #include "plugins/support/image/imagelayout.h"
 #include "plugins/support/recorddataset.h"
 #include "plugins/support/writing/headedfile.h"
@@ -8,12 +9,12 @@ namespace krv::plugins::demo
 {
 
 // A header, then pixels: channel after channel, rows top to bottom, values little-endian without padding; behind them
-// those of levels. Files are read and created, not updated. The header is text:
+// those of levels; masks and sensor models lie beside. Files are read and created, not updated. The header is text:
 //     DEMO1
 //     640 480             width and height
 //     8U 8U 32R           a data type for each channel
 //     scene=alps          and the record (support::RecordText)
-class DemoDataset : public support::RecordDataset
+class DemoDataset : public support::RecordDataset, public support::FacetsBeside
 {
 public:
     static const support::HeadedFile::FirstLines FIRST_LINES;

@@ -125,6 +125,10 @@ SharedImage::SharedImage(const std::string& fileName, std::unique_ptr<IDataset> 
     if (mpoRaster == nullptr)
         throw DataException(fileName + ": the file holds no image");
     mpoLevels = std::make_unique<LevelsBeside>(fileName, *mpoRaster, eMode);
+    if (eMode == eUpdate && !mpoRaster->GetRasterCapabilities().IsUpdatable())
+        mpoBeside = Find<ISidecarWriting>();
+    if (mpoBeside != nullptr)
+        mpoBeside->BeginSidecars();
 }
 
 SharedImage::~SharedImage()
@@ -240,6 +244,8 @@ AuxiliaryData GenericDataset::ReadAuxiliaryData()
 
 void GenericDataset::WriteAuxiliaryData(const AuxiliaryData& oData)
 {
+    if (auto* const poBeside = Get().GetBeside())
+        return poBeside->WriteTagsBeside(oData);
     Get().GetImage().WriteAuxiliaryData(oData);
 }
 
@@ -250,6 +256,8 @@ krv::ogc::cs::ICRS* GenericDataset::ReadCRS() const
 
 void GenericDataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
 {
+    if (auto* const poBeside = Get().GetBeside())
+        return poBeside->WriteCRSBeside(oCRS);
     Get().GetImage().UpdateCRS(oCRS);
 }
 
@@ -333,13 +341,19 @@ AccessCapabilities GenericDataset::GetRasterCapabilities()
 
 const krv::ogc::cs::GeocodingInfo& GenericDataset::GetGeocoding() const
 {
+    if (Get().GetGeocoding())
+        return *Get().GetGeocoding();
     const auto* const poGeocoded = Get().Find<IGeocodedDataset>();
     return poGeocoded != nullptr ? poGeocoded->GetGeocoding() : moIdentity;
 }
 
 void GenericDataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
 {
-    Need<IGeocodedDataset>("geocoding").SetGeocoding(oInfo);
+    auto* const poBeside = Get().GetBeside();
+    if (poBeside == nullptr)
+        return Need<IGeocodedDataset>("geocoding").SetGeocoding(oInfo);
+    poBeside->WriteGeocodingBeside(oInfo);
+    Get().SetGeocoding(oInfo);
 }
 
 std::vector<unsigned int> GenericDataset::GetBitmapList() const

@@ -5,11 +5,13 @@
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
+#include "datasources/interfaces/isidecardataset.h"
 #include "plugins/gdball/levelsbeside.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 
 #include <cstdio>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -43,6 +45,13 @@ public:
         return dynamic_cast<Facet*>(mpoImage.get());
     }
 
+    // Where the image's file is only read, though it was to be updated: what keeps beside it what it does not say. Else
+    // null.
+    krv::datasources::ISidecarWriting* GetBeside() const { return mpoBeside; }
+    // What was set beside it, which the image's own dataset may have answered otherwise before.
+    const std::optional<krv::ogc::cs::GeocodingInfo>& GetGeocoding() const { return moGeocoding; }
+    void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) { moGeocoding = oInfo; }
+
     void Synchronize();
 
     // The datasets over it are counted, whatever else keeps it. The last one closes the files when it is closed itself,
@@ -58,12 +67,15 @@ private:
     std::unique_ptr<krv::datasources::IDataset> mpoImage;
     krv::datasources::IRasterDataset* mpoRaster;
     std::unique_ptr<LevelsBeside> mpoLevels;
+    krv::datasources::ISidecarWriting* mpoBeside = nullptr;
+    std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding;
     AccessMode meMode;
     std::FILE* mpToken = nullptr; // what stands in the table
 };
 
-// A dataset over it: what the image has, with the levels beside it in place of its own. A change of its pixels makes
-// these outdated. The last of several that goes, or is closed, closes the files.
+// A dataset over it: what the image has, with the levels beside it in place of its own, and with what else can be kept
+// beside it where its file cannot be changed. A change of its pixels makes the levels outdated. The last of several
+// that goes, or is closed, closes the files.
 class GenericDataset : public krv::datasources::IDataset,
                        public krv::datasources::IRasterDataset,
                        public krv::datasources::IGeocodedDataset,

@@ -9,6 +9,7 @@ namespace krv::plugins::jp2
 Jp2Builder::Jp2Builder()
     : Builder("JPEG 2000 (JP2 files and codestreams)", {"jp2", "j2k", "j2c", "jpc", "jpx", "jph", "jhc"}, "JP2")
 {
+    DescribeOptions(CreateOptions::Describe());
 }
 
 Jp2Builder::~Jp2Builder() = default;

@@ -23,7 +23,7 @@ constexpr std::uint32_t SMALLEST_LEVEL = 1;
 } // namespace
 
 Jp2Dataset::Jp2Dataset(const std::string& fileName, krv::datasources::IFileFormat* poFormat)
-    : Dataset(fileName, poFormat)
+    : Dataset(fileName, poFormat), FacetsBeside(this)
 {
     FindCodestream(std::make_shared<support::File>(fileName, support::File::Mode::eRead));
     moBook = krv::datasources::AuxiliaryData(static_cast<unsigned int>(mpoStream->GetComponents().size()));
@@ -31,7 +31,7 @@ Jp2Dataset::Jp2Dataset(const std::string& fileName, krv::datasources::IFileForma
 }
 
 Jp2Dataset::Jp2Dataset(krv::datasources::IFileFormat* poFormat, std::shared_ptr<Jp2Writer> poWriter)
-    : Dataset(poFormat, poWriter), mpoWriter(std::move(poWriter))
+    : Dataset(poFormat, poWriter), FacetsBeside(this), mpoWriter(std::move(poWriter))
 {
 }
 
@@ -106,7 +106,25 @@ krv::datasources::IChannelInfo* Jp2Dataset::GetChannelInfo(unsigned int nChannel
 krv::datasources::AuxiliaryData Jp2Dataset::ReadAuxiliaryData()
 {
     GetImage();
-    return mpoWriter ? mpoWriter->GetRecord() : ReadRecord();
+    if (mpoWriter)
+        return mpoWriter->GetRecord();
+    krv::datasources::AuxiliaryData oRecord = ReadRecord();
+    GetSidecars().AddTags(oRecord);
+    return oRecord;
+}
+
+support::Sidecars::Needs Jp2Dataset::GetNeeds() const
+{
+    return {true, GetPlace().moGeocoding.IsIdentity(), GetPlace().mpoCRS == nullptr, true};
+}
+
+void Jp2Dataset::KeepBeside(const std::function<void(support::AuxXml&)>& oAdd) const
+{
+    if (mpoWriter->HasBoxes())
+        return;
+    support::AuxXml oAuxXml = GetSidecars().GetAuxXml();
+    oAdd(oAuxXml);
+    GetSidecars().SetAuxXml(std::move(oAuxXml));
 }
 
 void Jp2Dataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData)
@@ -116,6 +134,7 @@ void Jp2Dataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData
         Refuse("the metadata are those of " + std::to_string(oData.GetChannelCount()) + " channels, not of " +
                std::to_string(GetChanCount()));
     mpoWriter->SetRecord(oData);
+    KeepBeside([&oData](support::AuxXml& oAuxXml) { oAuxXml.SetTags(oData); });
 }
 
 krv::datasources::AuxiliaryData Jp2Dataset::ReadRecord() const
@@ -197,12 +216,18 @@ const GeoPlace& Jp2Dataset::GetPlace() const
 krv::ogc::cs::ICRS* Jp2Dataset::ReadCRS() const
 {
     const GeoPlace& oPlace = GetPlace();
-    return oPlace.mpoCRS ? oPlace.mpoCRS->Clone() : nullptr;
+    return oPlace.mpoCRS ? oPlace.mpoCRS->Clone() : mpoWriter ? nullptr : GetSidecars().ReadCRS().release();
 }
 
 const krv::ogc::cs::GeocodingInfo& Jp2Dataset::GetGeocoding() const
 {
-    return GetPlace().moGeocoding;
+    if (!moGeocoding)
+    {
+        moGeocoding = GetPlace().moGeocoding;
+        if (moGeocoding->IsIdentity() && !mpoWriter)
+            moGeocoding = GetSidecars().ReadGeocoding().value_or(*moGeocoding);
+    }
+    return *moGeocoding;
 }
 
 void Jp2Dataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
@@ -214,7 +239,9 @@ void Jp2Dataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
     support::GeoTags oTags = mpoWriter->GetGeoTags();
     support::SetGeocoding(oTags, oInfo);
     mpoWriter->SetGeoTags(std::move(oTags));
+    KeepBeside([&oInfo](support::AuxXml& oAuxXml) { oAuxXml.SetGeocoding(oInfo); });
     mpoPlace.reset();
+    moGeocoding.reset();
 }
 
 void Jp2Dataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
@@ -224,6 +251,7 @@ void Jp2Dataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
     support::GeoTags oTags = mpoWriter->GetGeoTags();
     support::SetCRS(oTags, oCRS, GetFileName(), oPlace);
     mpoWriter->SetGeoTags(std::move(oTags));
+    KeepBeside([&oCRS](support::AuxXml& oAuxXml) { oAuxXml.SetCRS(oCRS.GetWKT()); });
     mpoPlace.reset();
 }
 

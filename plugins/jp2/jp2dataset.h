@@ -9,8 +9,10 @@
 #include "plugins/jp2/reading/imageheader.h"
 #include "plugins/jp2/writing/jp2writer.h"
 #include "plugins/support/dataset.h"
+#include "plugins/support/facetsbeside.h"
 #include "plugins/support/overviewmanager.h"
 
+#include <functional>
 #include <map>
 #include <memory>
 #include <optional>
@@ -26,6 +28,7 @@ namespace krv::plugins::jp2
 class Jp2Dataset : public support::Dataset,
                    public krv::datasources::IGeocodedDataset,
                    public krv::datasources::IPCTDataset,
+                   public support::FacetsBeside,
                    private support::LevelStore
 {
 public:
@@ -60,6 +63,9 @@ public:
     void SetPCTDescription(unsigned int nPCT, const std::string& oDescription) override;
     void DeletePCT(unsigned int nPCT) override;
 
+protected:
+    support::Sidecars::Needs GetNeeds() const override;
+
 private:
     // As a store of levels.
     std::vector<Level> GetLevels() const override;
@@ -71,6 +77,8 @@ private:
 
     void FindCodestream(const std::shared_ptr<support::File>& poFile);
     const GeoPlace& GetPlace() const;
+    // What a bare codestream has no place for stands in ".aux.xml": oAdd puts it there.
+    void KeepBeside(const std::function<void(support::AuxXml&)>& oAdd) const;
     const std::optional<krv::gobs::PCT>& GetPalette() const;
     void CheckPCT(unsigned int nPCT, const Place& oPlace) const;
     krv::datasources::AuxiliaryData ReadRecord() const;
@@ -84,6 +92,7 @@ private:
     std::map<unsigned int, std::shared_ptr<support::BlockImage>> moLevels; // that are open
     krv::datasources::AuxiliaryData moBook;                                // empty: no level is invalid
     mutable std::unique_ptr<GeoPlace> mpoPlace;                            // looked for when it is asked for
+    mutable std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding;        // the file's or that of a file beside it
     mutable std::set<std::string> moComplaints;
 };
 

@@ -126,9 +126,38 @@ std::shared_ptr<support::BlockImage> KrvdskDataset::OpenBitmap(unsigned int nBit
     return poImage;
 }
 
-std::vector<unsigned int> KrvdskDataset::GetBitmapList() const
+std::vector<unsigned int> KrvdskDataset::ListInside() const
 {
     return ListWithLinked(Segment::BITMAP, &krv::datasources::IBitmapDataset::GetBitmapList);
+}
+
+std::string KrvdskDataset::DescribeInside(unsigned int nBitmap) const
+{
+    if (const auto* const poTheirs = FindLinkedBitmap(nBitmap))
+        return poTheirs->GetBitmapDescription(nBitmap);
+    return GetSegment(Segment::BITMAP, nBitmap, Place::Current()).moDescription;
+}
+
+std::vector<unsigned int> KrvdskDataset::GetBitmapList() const
+{
+    std::vector<unsigned int> oList = ListInside();
+    if (std::none_of(oList.begin(), oList.end(),
+                     [this](unsigned int nBitmap) { return DescribeInside(nBitmap).empty(); }))
+        for (const unsigned int nMask : GetSidecars().ListMasks())
+            oList.push_back(support::FIRST_BESIDE + nMask);
+    return oList;
+}
+
+unsigned int KrvdskDataset::FindBeside(unsigned int nBitmap) const
+{
+    const unsigned int nMask = nBitmap > support::FIRST_BESIDE ? nBitmap - support::FIRST_BESIDE : 0;
+    if (nMask == 0 || !GetSidecars().HasMask(nMask))
+        return 0;
+    const std::vector<unsigned int> oInside = ListInside();
+    const bool bBeside =
+        std::none_of(oInside.begin(), oInside.end(),
+                     [&](unsigned int nOne) { return nOne == nBitmap || DescribeInside(nOne).empty(); });
+    return bBeside ? nMask : 0;
 }
 
 krv::datasources::IRasterIO* KrvdskDataset::GetBitmapIO(const std::vector<unsigned int>& oBitmaps)
@@ -136,6 +165,11 @@ krv::datasources::IRasterIO* KrvdskDataset::GetBitmapIO(const std::vector<unsign
     std::vector<std::unique_ptr<krv::datasources::IRasterIO>> oParts;
     for (const unsigned int nBitmap : oBitmaps)
     {
+        if (const unsigned int nBeside = FindBeside(nBitmap))
+        {
+            oParts.emplace_back(GetSidecars().OpenMask(nBeside, false));
+            continue;
+        }
         if (auto* const poTheirs = FindLinkedBitmap(nBitmap))
         {
             oParts.push_back(std::make_unique<LinkedIO>(mpoLink, LinkedIO::Size{GetWidth(), GetHeight()},
@@ -150,6 +184,15 @@ krv::datasources::IRasterIO* KrvdskDataset::GetBitmapIO(const std::vector<unsign
     return new support::StackedIO(std::move(oParts), 1, 1);
 }
 
+krv::datasources::MetadataMap KrvdskDataset::MakeBitmapTags(const krv::datasources::MetadataMap& oMetadata) const
+{
+    krv::datasources::AuxiliaryData oBook(1);
+    oBook.SetChanMetadata(oMetadata, 1);
+    for (const auto& [nLevel, oSize] : GetCatalogue().moBitmapLevels)
+        SetLevelValid(oBook, 1, nLevel, false, {});
+    return oBook.GetChanMetadata(1);
+}
+
 unsigned int KrvdskDataset::CreateBitmap()
 {
     const Place oPlace = Place::Current();
@@ -157,10 +200,7 @@ unsigned int KrvdskDataset::CreateBitmap()
     Segment oSegment;
     oSegment.moKind = Segment::BITMAP;
     oSegment.mpoPlane = oCatalogue.MakeBitmapPlane();
-    krv::datasources::AuxiliaryData oBook(1);
-    for (const auto& [nLevel, oSize] : oCatalogue.moBitmapLevels)
-        SetLevelValid(oBook, 1, nLevel, false, {});
-    oSegment.moMetadata = oBook.GetChanMetadata(1);
+    oSegment.moMetadata = MakeBitmapTags({});
     oSegment.moDescription = "Bitmap " + std::to_string(oCatalogue.mnNextSegment);
     const unsigned int nBitmap = AddSegment(std::move(oSegment), oPlace);
     std::erase_if(moBitmaps, [](const auto& oOpened) { return oOpened.first.first == 0; });
@@ -179,9 +219,8 @@ void KrvdskDataset::DeleteBitmap(unsigned int nBitmap)
 
 std::string KrvdskDataset::GetBitmapDescription(unsigned int nBitmap) const
 {
-    if (const auto* const poTheirs = FindLinkedBitmap(nBitmap))
-        return poTheirs->GetBitmapDescription(nBitmap);
-    return GetSegment(Segment::BITMAP, nBitmap, Place::Current()).moDescription;
+    const unsigned int nBeside = FindBeside(nBitmap);
+    return nBeside != 0 ? GetSidecars().DescribeMask(nBeside) : DescribeInside(nBitmap);
 }
 
 void KrvdskDataset::SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription)
@@ -192,6 +231,8 @@ void KrvdskDataset::SetBitmapDescription(unsigned int nBitmap, const std::string
 // What it says of its levels is kept by their manager.
 krv::datasources::MetadataMap KrvdskDataset::GetBitmapMetadata(unsigned int nBitmap) const
 {
+    if (const unsigned int nBeside = FindBeside(nBitmap))
+        return GetSidecars().GetMaskTags(nBeside);
     if (const auto* const poTheirs = FindLinkedBitmap(nBitmap))
         return poTheirs->GetBitmapMetadata(nBitmap);
     krv::datasources::AuxiliaryData oBook(1);
@@ -215,24 +256,28 @@ void KrvdskDataset::SetBitmapMetadata(unsigned int nBitmap, const krv::datasourc
 
 krv::datasources::IOverviewManager* KrvdskDataset::GetBitmapOverviewManager()
 {
-    std::unique_ptr<krv::datasources::IOverviewManager> poOwn;
-    if (!ListSegments(Segment::BITMAP).empty())
-    {
-        if (!mpoBitmapLevels)
-            mpoBitmapLevels = std::make_shared<BitmapLevels>(*this);
-        poOwn = std::make_unique<support::OverviewManager>(*this, *mpoBitmapLevels);
-    }
     auto* const poLinked = mpoLink ? mpoLink->Find<krv::datasources::IBitmapDataset>() : nullptr;
+    if (GetBitmapList().empty())
+        return nullptr;
+    if (!mpoBitmapLevels)
+        mpoBitmapLevels = std::make_shared<BitmapLevels>(*this);
+    std::unique_ptr<krv::datasources::IOverviewManager> poOwn =
+        std::make_unique<support::OverviewManager>(*this, *mpoBitmapLevels);
     std::unique_ptr<krv::datasources::IOverviewManager> poTheirs(
         poLinked != nullptr ? poLinked->GetBitmapOverviewManager() : nullptr);
-    if (!poTheirs)
+    if (poLinked == nullptr || poLinked->GetBitmapList().empty())
         return poOwn.release();
-    const auto Source = [this](unsigned int nBitmap)
+    const auto FindSource = [this](unsigned int nBitmap, unsigned int)
     {
         return FindLinkedBitmap(nBitmap) != nullptr ? nBitmap : 0;
     };
-    return new LinkedLevels(mpoLink, std::move(poOwn), std::move(poTheirs), Source,
-                            static_cast<unsigned int>(GetBitmapList().size()));
+    const auto TakeOver = [this](unsigned int nBitmap, unsigned int)
+    {
+        for (const unsigned int nTheirs : nBitmap == 0 ? GetBitmapList() : std::vector<unsigned int>{nBitmap})
+            TakeBitmap(nTheirs);
+    };
+    return new LinkedLevels(mpoLink, std::move(poOwn), std::move(poTheirs),
+                            {FindSource, TakeOver, false, static_cast<unsigned int>(GetBitmapList().size())});
 }
 
 } // namespace krv::plugins::krvdsk

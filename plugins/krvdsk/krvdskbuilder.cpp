@@ -11,7 +11,10 @@
 namespace krv::plugins::krvdsk
 {
 
-KrvdskBuilder::KrvdskBuilder() : Builder("Native file of the toolkit", {"krv"}, "KRVDSK") {}
+KrvdskBuilder::KrvdskBuilder() : Builder("Native file of the toolkit", {"krv"}, "KRVDSK")
+{
+    DescribeOptions(CreateOptions::Describe());
+}
 
 KrvdskBuilder::~KrvdskBuilder() = default;
 

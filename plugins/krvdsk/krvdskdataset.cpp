@@ -1,6 +1,7 @@
 #include "plugins/krvdsk/krvdskdataset.h"
 
 #include "gobs/raster/rasterinfo.h"
+#include "plugins/krvdsk/link/linkedlevelsource.h"
 #include "plugins/krvdsk/link/linkedsource.h"
 #include "plugins/support/codec/checksum.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -140,11 +141,17 @@ std::shared_ptr<support::IBlockSource> KrvdskDataset::MakeLevelSource(unsigned i
         ForgetOldPixels();
     };
     const Catalogue& oCatalogue = GetCatalogue();
-    const auto poOwn = nLevel == 1 ? MakeSource(oCatalogue.moPlanes, 1, oCatalogue.moSize, BeforeWrite)
-                                   : MakeSource(oCatalogue.moPlanes, nLevel, oCatalogue.moLevels.at(nLevel), {});
+    const auto poOwn = nLevel == 1
+                           ? MakeSource(oCatalogue.moPlanes, 1, oCatalogue.moSize, BeforeWrite)
+                           : MakeSource(oCatalogue.GetLevelPlanes(), nLevel, oCatalogue.moLevels.at(nLevel), {});
     if (oCatalogue.moLinked.empty())
         return poOwn;
-    return std::make_shared<LinkedSource>(mpoLink, oCatalogue.moLinked, nLevel, poOwn);
+    if (nLevel == 1)
+        return std::make_shared<LinkedSource>(mpoLink, oCatalogue.moLinked, poOwn);
+    std::vector<LinkedLevelSource::Channel> oLinked;
+    for (std::size_t nAt = 0; nAt < oCatalogue.moLinked.size(); ++nAt)
+        oLinked.push_back({oCatalogue.moLinked[nAt].mnNumber, oCatalogue.moLinkedPlanes[nAt]->moTables.at(nLevel)});
+    return std::make_shared<LinkedLevelSource>(mpoLink, std::move(oLinked), nLevel, poOwn);
 }
 
 support::LevelStore::Level KrvdskDataset::DescribeLevel(unsigned int nLevel) const
@@ -167,13 +174,13 @@ void KrvdskDataset::StoreRecord(const support::RecordText& oRecord) const
             oCatalogue.moLevels.contains(nLevel) ? oCatalogue.moLevels[nLevel] : oCatalogue.GetUsualSize(nLevel);
     for (const auto& [nLevel, oSize] : oCatalogue.moLevels)
         if (!oLevels.contains(nLevel))
-            for (const std::shared_ptr<Plane>& poPlane : oCatalogue.moPlanes)
+            for (const std::shared_ptr<Plane>& poPlane : oCatalogue.GetLevelPlanes())
             {
                 mpoWriter->DropTable(*poPlane->moTables.at(nLevel));
                 poPlane->moTables.erase(nLevel);
             }
     for (const auto& [nLevel, oSize] : oLevels)
-        for (const std::shared_ptr<Plane>& poPlane : oCatalogue.moPlanes)
+        for (const std::shared_ptr<Plane>& poPlane : oCatalogue.GetLevelPlanes())
             if (!poPlane->moTables.contains(nLevel))
                 poPlane->moTables[nLevel] = oCatalogue.MakeTable(oSize);
     oCatalogue.moLevels = std::move(oLevels);
@@ -216,6 +223,9 @@ void KrvdskDataset::DeleteChannel(unsigned int nChannel)
     const unsigned int nLinkedPlanes = LinkedSource::CountPlanes(oLinked);
     if (oAt.mnPlane < nLinkedPlanes)
     {
+        auto& oLevels = oWriter.GetCatalogue().moLinkedPlanes;
+        oWriter.DropPlane(*oLevels[nChannel - 1]);
+        oLevels.erase(oLevels.begin() + (nChannel - 1));
         oLinked.erase(oLinked.begin() + (nChannel - 1));
         return ChangeChannels(oSources);
     }
@@ -238,18 +248,20 @@ void KrvdskDataset::DeleteChannel(unsigned int nChannel)
 // Whoever still holds an I/O object of before is refused: its channels are others now.
 void KrvdskDataset::ChangeChannels(const std::vector<unsigned int>& oSources)
 {
-    for (std::shared_ptr<Plane>& poPlane : mpoWriter->GetCatalogue().moPlanes)
-    {
-        const auto poNew = std::make_shared<Plane>(*poPlane);
-        poPlane->mbGone = true;
-        poPlane = poNew;
-    }
+    Catalogue& oCatalogue = mpoWriter->GetCatalogue();
+    for (auto* const pPlanes : {&oCatalogue.moLinkedPlanes, &oCatalogue.moPlanes})
+        for (std::shared_ptr<Plane>& poPlane : *pPlanes)
+        {
+            const auto poNew = std::make_shared<Plane>(*poPlane);
+            poPlane->mbGone = true;
+            poPlane = poNew;
+        }
     std::vector<std::vector<std::string>> oHistories;
     for (const unsigned int nSource : oSources)
         oHistories.push_back(nSource == 0 ? std::vector<std::string>() : moHistories[nSource - 1]);
     moHistories = std::move(oHistories);
     moHistoryFacets.clear();
-    for (auto& [nNumber, oSegment] : mpoWriter->GetCatalogue().moSegments)
+    for (auto& [nNumber, oSegment] : oCatalogue.moSegments)
     {
         const auto oFound = std::find(oSources.begin(), oSources.end(), oSegment.mnChannel);
         if (oSegment.mnChannel != 0)
@@ -353,7 +365,7 @@ void KrvdskDataset::ForEachPiece(const std::function<void(const Entry& oEntry, c
                 oComplain);
         }
     };
-    for (const std::shared_ptr<Plane>& poPlane : oCatalogue.moPlanes)
+    for (const std::shared_ptr<Plane>& poPlane : oCatalogue.GetLevelPlanes())
         Walk(*poPlane, oCatalogue.moLevels);
     for (const auto& [nNumber, oSegment] : oCatalogue.moSegments)
     {

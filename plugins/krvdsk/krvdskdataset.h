@@ -1,6 +1,8 @@
 #pragma once
 
 #include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/iblockencoding.h"
+#include "datasources/interfaces/iencodedblocks.h"
 #include "datasources/interfaces/iephemerisdataset.h"
 #include "datasources/interfaces/ihistoryio.h"
 #include "datasources/interfaces/ilinkeddataset.h"
@@ -39,7 +41,9 @@ class KrvdskDataset : public support::RecordDataset,
                       public krv::datasources::IEphemerisRecords,
                       public krv::datasources::ILinkedDataset,
                       public krv::datasources::IStorageDataset,
-                      public krv::datasources::IVerifiedDataset
+                      public krv::datasources::IVerifiedDataset,
+                      public krv::datasources::IEncodedBlocks,
+                      public krv::datasources::IBlockEncoding
 {
 public:
     // Throws krv::FileException kinds that name file and cause; nothing stays open then.
@@ -109,6 +113,16 @@ public:
     std::optional<std::uint64_t> GetUnusedBytes() override;
     std::vector<std::string> Verify(const Progress& oProgress) override;
 
+    // Of files whose channels are stored in one way: of one type, all together or each by itself, none of them deleted
+    // or linked. Others say so by mbReadable and take no blocks. Checksums are compared with what is read.
+    krv::datasources::EncodedForm GetEncodedForm(unsigned int nLevel) override;
+    bool ReadEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock,
+                     std::vector<unsigned char>& oBytes) override;
+    bool SetEncodedForm(unsigned int nLevel, const krv::datasources::EncodedForm& oForm) override;
+    void StoreEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock, const unsigned char* pBytes,
+                      std::size_t nBytes) override;
+    krv::datasources::IBlockEncoder* MakeBlockEncoder(unsigned int nLevel) override;
+
 protected:
     void StoreRecord(const support::RecordText& oRecord) const override;
     std::uint64_t MakeRoom(unsigned int nLevel) override { return nLevel; }
@@ -118,8 +132,22 @@ protected:
 private:
     class BitmapLevels;
     class History;
+    struct CodedTile
+    {
+        std::shared_ptr<TileTable> mpoTable;
+        std::uint64_t mnTile;
+        bool mbPlain;
+        std::size_t mnMost; // bytes
+    };
 
     const Catalogue& GetCatalogue() const { return mpoWriter ? mpoWriter->GetCatalogue() : moCatalogue; }
+    // The bitmaps of the file and of the linked one, and what one of them is called.
+    std::vector<unsigned int> ListInside() const;
+    std::string DescribeInside(unsigned int nBitmap) const;
+    // The mask beside the file that a bitmap is, which there is where those inside do not say it; else 0.
+    unsigned int FindBeside(unsigned int nBitmap) const;
+    // The model beside it that a segment is, where there are no others; else 0.
+    unsigned int FindModelBeside(unsigned int nSegment) const;
     // Of a file that is changed; throws DataException for any other.
     StoreWriter& GetWriter(const char* pWhat, const Place& oPlace) const;
     void ShowFile();
@@ -140,6 +168,10 @@ private:
     template <class Facet>
     Facet* FindLinkedSegment(const std::string& kind, unsigned int nNumber,
                              std::vector<unsigned int> (Facet::*pList)() const) const;
+    void TakeLevel(unsigned int nLevel, krv::datasources::IOverviewManager& oTheirs);
+    void TakeBitmap(unsigned int nBitmap);
+    // Of a bitmap that comes, none of whose levels is valid.
+    krv::datasources::MetadataMap MakeBitmapTags(const krv::datasources::MetadataMap& oMetadata) const;
     void ShowImage();
     std::shared_ptr<support::IBlockSource> MakeSource(std::vector<std::shared_ptr<Plane>> oPlanes, unsigned int nLevel,
                                                       const ImageSize& oSize, std::function<void()> oBeforeWrite) const;
@@ -148,6 +180,13 @@ private:
     // Everything that the state names, but for its root.
     void ForEachPiece(const std::function<void(const Entry& oEntry, const std::string& what)>& oAction,
                       const TileTable::Complain& oComplain);
+    // Throws DataException for a level that does not exist.
+    ImageSize GetLevelSize(unsigned int nLevel, const Place& oPlace) const;
+    CodedTile FindTile(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock, const Place& oPlace) const;
+    bool TakesStorage(const krv::datasources::EncodedForm& oForm, unsigned int nLevel) const;
+    std::unique_ptr<Catalogue> MakeCatalogue(const krv::datasources::EncodedForm& oForm, const Place& oPlace) const;
+    // A level of which nothing is stored gets another size.
+    void LayOutLevel(unsigned int nLevel, const ImageSize& oSize);
     std::shared_ptr<support::BlockImage> OpenBitmap(unsigned int nBitmap, unsigned int nLevel);
 
     // Segments. Those of a kind, ascending; one of them, or a DataException when there is none of that kind.

@@ -29,6 +29,20 @@ unsigned int LastNumber(Link& oLink, std::vector<unsigned int> (Facet::*pList)()
     return oList.empty() ? 0 : *std::max_element(oList.begin(), oList.end());
 }
 
+// In rows of blocks. Both are of one size.
+void CopyImage(IRasterIO& oFrom, IRasterIO& oTo, std::size_t nPixelBytes)
+{
+    const unsigned int nWidth = oTo.GetFileWidth(), nHeight = oTo.GetFileHeight();
+    const unsigned int nRows = std::min(std::max(oTo.GetTileHeight(), 1U), nHeight);
+    std::vector<unsigned char> oPixels(nPixelBytes * nWidth * nRows);
+    for (unsigned int nY = 0; nY < nHeight; nY += nRows)
+    {
+        const unsigned int nCount = std::min(nRows, nHeight - nY);
+        oFrom.ReadWindow(0U, nY, nWidth, nCount, oPixels.data());
+        oTo.WriteWindow(0U, nY, nWidth, nCount, oPixels.data());
+    }
+}
+
 } // namespace
 
 void KrvdskDataset::ShowLink()
@@ -56,6 +70,8 @@ void KrvdskDataset::LinkChannels(Catalogue& oCatalogue, const std::vector<krv::g
           LastNumber(oLink, &ILUTDataset::GetLUTList), LastNumber(oLink, &IMathModelDataset::GetMathModelList),
           LastNumber(oLink, &IEphemerisDataset::GetEphemerisList)})
         oCatalogue.mnNextSegment = std::max(oCatalogue.mnNextSegment, std::min(nLast, UINT32_MAX - 1) + 1);
+    for (const krv::gobs::DataType& oType : oTypes)
+        oCatalogue.moLinkedPlanes.push_back(oCatalogue.MakeLinkedPlane(oType, GetFileName(), oPlace));
 }
 
 unsigned int KrvdskDataset::FindLinked(unsigned int nChannel) const
@@ -113,11 +129,83 @@ IOverviewManager* KrvdskDataset::GetOverviewManager()
     std::unique_ptr<IOverviewManager> poTheirs(poLinked != nullptr ? poLinked->GetOverviewManager() : nullptr);
     if (!poTheirs)
         return poOwn.release();
-    const auto Source = [this](unsigned int nChannel)
+    const auto FindSource = [this](unsigned int nChannel, unsigned int nLevel)
     {
-        return FindLinked(nChannel);
+        const unsigned int nLinked = FindLinked(nChannel);
+        if (nLinked == 0 || !GetCatalogue().moLevels.contains(nLevel))
+            return nLinked;
+        return GetCatalogue().moLinkedPlanes[nChannel - 1]->moTables.at(nLevel)->IsEmpty() ? nLinked : 0;
     };
-    return new LinkedLevels(mpoLink, std::move(poOwn), std::move(poTheirs), Source, GetChanCount());
+    const auto TakeOver = [this, poOther = std::shared_ptr<IOverviewManager>(poLinked->GetOverviewManager())](
+                              unsigned int nChannel, unsigned int nLevel)
+    {
+        if (nChannel != 0)
+            TakeLevel(nLevel, *poOther);
+    };
+    return new LinkedLevels(mpoLink, std::move(poOwn), std::move(poTheirs),
+                            {FindSource, TakeOver, true, GetChanCount()});
+}
+
+// A level of the other file becomes one of the file's own, for all linked channels whose it is.
+void KrvdskDataset::TakeLevel(unsigned int nLevel, IOverviewManager& oTheirs)
+{
+    GetWriter("levels cannot be changed", Place::Current());
+    const std::unique_ptr<IOverviewManager> poOwn(RecordDataset::GetOverviewManager());
+    const bool bNew = !GetCatalogue().moLevels.contains(nLevel);
+    if (bNew)
+    {
+        poOwn->CreateLevel(nLevel);
+        LayOutLevel(nLevel, {oTheirs.GetLevelWidth(nLevel), oTheirs.GetLevelHeight(nLevel)});
+    }
+    try
+    {
+        for (unsigned int nChannel = 1; nChannel <= GetCatalogue().moLinked.size(); ++nChannel)
+        {
+            if (!GetCatalogue().moLinkedPlanes[nChannel - 1]->moTables.at(nLevel)->IsEmpty())
+                continue;
+            const unsigned int nSource = FindLinked(nChannel);
+            const std::unique_ptr<IRasterIO> poFrom(oTheirs.GetOverviewIO(nLevel, {nSource})),
+                poTo(poOwn->GetOverviewIO(nLevel, {nChannel}));
+            CopyImage(*poFrom, *poTo, GetCatalogue().moLinked[nChannel - 1].moType.GetValueBits() / 8);
+            poOwn->SetValid(nChannel, nLevel, oTheirs.IsValid(nSource, nLevel));
+        }
+    }
+    catch (...)
+    {
+        if (bNew)
+            poOwn->DeleteLevel(nLevel);
+        throw;
+    }
+}
+
+// A bitmap of the other file becomes one of the file's own, under the number that it has.
+void KrvdskDataset::TakeBitmap(unsigned int nBitmap)
+{
+    const Place oPlace = Place::Current();
+    StoreWriter& oWriter = GetWriter("bitmaps cannot be changed", oPlace);
+    IBitmapDataset* const poTheirs = FindLinkedBitmap(nBitmap);
+    if (poTheirs == nullptr)
+        return;
+    Segment oSegment;
+    oSegment.moKind = Segment::BITMAP;
+    oSegment.mpoPlane = oWriter.GetCatalogue().MakeBitmapPlane();
+    oSegment.moDescription = poTheirs->GetBitmapDescription(nBitmap);
+    oSegment.moMetadata = MakeBitmapTags(poTheirs->GetBitmapMetadata(nBitmap));
+    const std::unique_ptr<IRasterIO> poFrom(poTheirs->GetBitmapIO({nBitmap}));
+    oWriter.GetCatalogue().moSegments[nBitmap] = std::move(oSegment);
+    oWriter.GetCatalogue().Describe();
+    oWriter.Touch();
+    std::erase_if(moBitmaps, [](const auto& oOpened) { return oOpened.first.first == 0; });
+    try
+    {
+        const std::unique_ptr<IRasterIO> poTo(GetBitmapIO({nBitmap}));
+        CopyImage(*poFrom, *poTo, 1);
+    }
+    catch (...)
+    {
+        DeleteBitmap(nBitmap);
+        throw;
+    }
 }
 
 } // namespace krv::plugins::krvdsk

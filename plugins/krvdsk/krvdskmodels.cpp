@@ -46,11 +46,26 @@ RpcModel* ReadModel(BytesReader oReader)
 
 std::vector<unsigned int> KrvdskDataset::GetMathModelList() const
 {
-    return ListWithLinked(Segment::MODEL, &IMathModelDataset::GetMathModelList);
+    std::vector<unsigned int> oList = ListWithLinked(Segment::MODEL, &IMathModelDataset::GetMathModelList);
+    if (oList.empty())
+        for (const unsigned int nModel : GetSidecars().ListModels())
+            oList.push_back(support::FIRST_BESIDE + nModel);
+    return oList;
+}
+
+unsigned int KrvdskDataset::FindModelBeside(unsigned int nSegment) const
+{
+    const std::vector<unsigned int> oList = GetMathModelList();
+    const bool bBeside = nSegment > support::FIRST_BESIDE &&
+                         std::find(oList.begin(), oList.end(), nSegment) != oList.end() &&
+                         ListWithLinked(Segment::MODEL, &IMathModelDataset::GetMathModelList).empty();
+    return bBeside ? nSegment - support::FIRST_BESIDE : 0;
 }
 
 IMathModel* KrvdskDataset::GetMathModel(unsigned int nSegment)
 {
+    if (const unsigned int nBeside = FindModelBeside(nSegment))
+        return new RpcModel(GetSidecars().ReadModel(nBeside));
     if (auto* const poTheirs = FindLinkedSegment(Segment::MODEL, nSegment, &IMathModelDataset::GetMathModelList))
         return poTheirs->GetMathModel(nSegment);
     const std::vector<unsigned char> oBytes = ReadSegment(Segment::MODEL, nSegment, Place::Current());

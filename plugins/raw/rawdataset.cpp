@@ -2,7 +2,6 @@
 
 #include "gobs/pct/pct.h"
 #include "plugins/raw/envirecord.h"
-#include "plugins/support/sidecar/modelsidecars.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/crsfactory.h"
@@ -49,20 +48,22 @@ void RawOptions::List(support::Options& oOptions)
 }
 
 RawDataset::RawDataset(RawFiles oFiles, krv::datasources::IFileFormat* poFormat)
-    : Dataset(oFiles.moData.empty() ? oFiles.moHeader : oFiles.moData, poFormat), moImage(ReadWhole(std::move(oFiles)))
+    : Dataset(oFiles.moData.empty() ? oFiles.moHeader : oFiles.moData, poFormat), FacetsBeside(this),
+      moImage(ReadWhole(std::move(oFiles)))
 {
     ShowImage(std::make_shared<support::File>(moImage.moFiles.moData, support::File::Mode::eRead));
 }
 
 RawDataset::RawDataset(krv::datasources::IFileFormat* poFormat, RawFiles oFiles, std::shared_ptr<RawWriter> poWriter)
-    : Dataset(poFormat, poWriter), moImage(ReadWhole(std::move(oFiles))), mpoWriter(std::move(poWriter))
+    : Dataset(poFormat, poWriter), FacetsBeside(this), moImage(ReadWhole(std::move(oFiles))),
+      mpoWriter(std::move(poWriter))
 {
     ShowImage(mpoWriter->GetFile());
 }
 
 RawDataset::RawDataset(krv::datasources::IFileFormat* poFormat, const RawOptions& oOptions,
                        std::shared_ptr<RawWriter> poWriter)
-    : Dataset(poFormat, poWriter), moOptions(oOptions), mpoWriter(std::move(poWriter))
+    : Dataset(poFormat, poWriter), FacetsBeside(this), moOptions(oOptions), mpoWriter(std::move(poWriter))
 {
 }
 
@@ -82,6 +83,7 @@ void RawDataset::ShowImage(std::shared_ptr<support::File> poFile)
     const auto BeforeWrite = [this]
     {
         mpoWriter->BeginChange();
+        ForgetPixelsBeside();
     };
     mpoSource =
         std::make_shared<support::PlainSource>(std::move(poFile), oForm.PlacePlanes(), oForm.IsSwapped(),
@@ -134,24 +136,8 @@ krv::datasources::FileAccessState RawDataset::Delete()
     return eState;
 }
 
-void RawDataset::Synchronize()
-{
-    if (HasImage() && mbZone)
-        Refuse("a zone cannot be kept beside the file: a bitmap without a description, the validity mask, can");
-    Dataset::Synchronize();
-    if (!IsWritten() || !HasImage())
-        return;
-    GetSidecars().StoreMask();
-    if (moModel)
-        support::WriteModelSidecar(GetFileName(), *moModel);
-    moModel.reset();
-    GetSidecars().StoreAuxXml();
-}
-
 void RawDataset::Close()
 {
-    if (mpoWriter && !mpoWriter->IsEnded())
-        Synchronize();
     Dataset::Close();
     mpoSource.reset();
 }
@@ -171,7 +157,6 @@ void RawDataset::StoreHeader() const
 
 void RawDataset::StoreBeside(support::AuxXml oAuxXml) const
 {
-    mpoWriter->BeginChange();
     GetSidecars().SetAuxXml(std::move(oAuxXml));
 }
 

@@ -1,16 +1,14 @@
 #pragma once
 
-#include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/igeocodeddataset.h"
-#include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/iplaceremoval.h"
 #include "plugins/raw/rawimage.h"
 #include "plugins/raw/rawwriter.h"
 #include "plugins/support/dataset.h"
+#include "plugins/support/facetsbeside.h"
 #include "plugins/support/image/plainsource.h"
 #include "plugins/support/writing/options.h"
-#include "toolkit/mathmodel/rpccoefficients.h"
 
 #include <memory>
 #include <string>
@@ -30,14 +28,12 @@ struct RawOptions
 };
 
 // A plain file with its header. Pixels are read and written without blocks. A header of ENVI's is changed as a whole,
-// others are not changed; what a header does not say stands in the file ".aux.xml" beside it. The validity mask, bitmap
-// 1, is the file ".msk"; there are no zones.
+// others are not changed; what a header does not say stands in the file ".aux.xml" beside it.
 class RawDataset : public support::Dataset,
                    public krv::datasources::IGeocodedDataset,
                    public krv::datasources::IPCTDataset,
-                   public krv::datasources::IBitmapDataset,
-                   public krv::datasources::IMathModelDataset,
-                   public krv::datasources::IPlaceRemoval
+                   public krv::datasources::IPlaceRemoval,
+                   public support::FacetsBeside
 {
 public:
     // Files to be read. Throws krv::FileException kinds that name file and cause.
@@ -54,7 +50,6 @@ public:
     using support::Dataset::Create;
     krv::datasources::IRasterIO* GetRasterIO(const std::vector<unsigned int>& oChannels) override;
     krv::datasources::FileAccessState Delete() override;
-    void Synchronize() override;
     void Close() override;
 
     krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
@@ -76,23 +71,6 @@ public:
     void SetPCTDescription(unsigned int nPCT, const std::string& oDescription) override;
     void DeletePCT(unsigned int nPCT) override;
 
-    std::vector<unsigned int> GetBitmapList() const override;
-    krv::datasources::IRasterIO* GetBitmapIO(const std::vector<unsigned int>& oBitmaps) override;
-    void DeleteBitmap(unsigned int nBitmap) override;
-    unsigned int CreateBitmap() override;
-    std::string GetBitmapDescription(unsigned int nBitmap) const override;
-    void SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription) override;
-    krv::datasources::MetadataMap GetBitmapMetadata(unsigned int nBitmap) const override;
-    void SetBitmapMetadata(unsigned int nBitmap, const krv::datasources::MetadataMap& oMetadata) override;
-    krv::datasources::IOverviewManager* GetBitmapOverviewManager() override { return nullptr; }
-
-    // Those of the texts beside the file; a rational polynomial model is written to the first one.
-    bool HasMathModel() const override { return !GetMathModelList().empty(); }
-    std::vector<unsigned int> GetMathModelList() const override;
-    krv::mathmodel::IMathModel* GetMathModel(unsigned int nSegment) override;
-    unsigned int CreateMathModel(const krv::mathmodel::IMathModel& oModel) override;
-    void DeleteMathModel(unsigned int nSegment) override;
-
 protected:
     support::Sidecars::Needs GetNeeds() const override;
 
@@ -103,7 +81,6 @@ private:
     void StoreBeside(support::AuxXml oAuxXml) const;
     void StoreCRS(const krv::ogc::cs::ICRS* poCRS, const char* pRefusal, const Place& oPlace) const;
     void StoreGeocoding(const krv::ogc::cs::GeocodingInfo* poInfo, const char* pRefusal, const Place& oPlace);
-    void CheckBitmap(unsigned int nBitmap, const Place& oPlace) const;
     HeaderText& GetHeader(const char* pWhat, const Place& oPlace) const;
     void StoreHeader() const;
     void StorePCT(const krv::gobs::PCT& oTable, const Place& oPlace);
@@ -114,8 +91,6 @@ private:
     std::shared_ptr<RawWriter> mpoWriter; // null when the file is only read
     std::shared_ptr<support::PlainSource> mpoSource;
     mutable std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding;
-    std::optional<krv::mathmodel::RpcCoefficients> moModel; // to be written
-    bool mbZone = false;                                    // the new mask has not been made one of validity
 };
 
 } // namespace krv::plugins::raw

@@ -1,45 +1,12 @@
 #include "plugins/raw/rawwriter.h"
 
+#include "plugins/support/writing/setaside.h"
 #include "toolkit/exceptions/exceptions.h"
 
-#include <cstdio>
 #include <utility>
 
 namespace krv::plugins::raw
 {
-
-namespace
-{
-
-// An old file out of the way of a new one: back in its place unless the new one is there.
-class SetAside
-{
-public:
-    explicit SetAside(const std::string& fileName) : moFileName(fileName), moAside(fileName + ".part")
-    {
-        mbMoved = std::rename(moFileName.c_str(), moAside.c_str()) == 0;
-    }
-    SetAside(const SetAside&) = delete;
-    SetAside& operator=(const SetAside&) = delete;
-    ~SetAside()
-    {
-        if (mbMoved)
-            std::rename(moAside.c_str(), moFileName.c_str());
-    }
-
-    void Drop()
-    {
-        if (std::exchange(mbMoved, false))
-            std::remove(moAside.c_str());
-    }
-
-private:
-    std::string moFileName;
-    std::string moAside;
-    bool mbMoved;
-};
-
-} // namespace
 
 RawWriter::RawWriter(const std::string& fileName, const std::string& headerName)
     : FileWriter(fileName), moHeaderName(headerName)
@@ -104,7 +71,7 @@ void RawWriter::Store()
 void RawWriter::GiveName()
 {
     const auto poHeader = MakeHeader();
-    SetAside oOld(moHeaderName);
+    support::SetAside oOld({moHeaderName});
     FileWriter::GiveName();
     oOld.Drop();
     poHeader->TakeName(true);

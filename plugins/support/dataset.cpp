@@ -1,9 +1,11 @@
 #include "plugins/support/dataset.h"
 
 #include "datasources/interfaces/channelinfo.h"
+#include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/raster/rasterinfo.h"
 #include "plugins/support/image/rasterio.h"
+#include "plugins/support/sidecar/sidecarfile.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 
@@ -45,12 +47,13 @@ void Dataset::Refuse(const std::string& what, const Place& oPlace) const
 
 void Dataset::Abandon() const noexcept
 {
-    if (!mpoWriter)
+    if (!WritesBeside())
         return;
     try
     {
         const Place oPlace = Place::Current();
-        if (mpoWriter->HasUnsaved() && std::uncaught_exceptions() <= mnExceptions)
+        const bool bUnsaved = (mpoWriter && mpoWriter->HasUnsaved()) || (mpoSidecars && mpoSidecars->HoldsChanges());
+        if (bUnsaved && std::uncaught_exceptions() <= mnExceptions)
             krv::nspio::Warning::Warn(moName +
                                           ": the dataset goes without Synchronize or Close; what was written since "
                                           "the last one is lost",
@@ -60,7 +63,16 @@ void Dataset::Abandon() const noexcept
     {
         // A sink that throws has been told.
     }
-    mpoWriter->Discard();
+    if (mpoWriter)
+        mpoWriter->Discard();
+    mpoSidecars.reset();
+}
+
+void Dataset::CheckWritingBeside(const char* pWhat, const Place& oPlace) const
+{
+    CheckOpen(oPlace);
+    if (!mbSidecarsWritten)
+        CheckWriting(pWhat, oPlace);
 }
 
 void Dataset::CheckWriting(const char* pWhat, const Place& oPlace) const
@@ -122,7 +134,91 @@ std::vector<krv::datasources::Sidecar> Dataset::ListSidecars()
 {
     if (!HasImage())
         return {};
-    return GetSidecars().List(GetNeeds());
+    Sidecars::Needs oNeeds = GetNeeds();
+    const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(GetOverviewManager());
+    oNeeds.mbLevels = poLevels == nullptr || poLevels->GetLevels().empty();
+    return GetSidecars().List(oNeeds);
+}
+
+void Dataset::ForgetPixelsBeside()
+{
+    if (IsNamed())
+        GetSidecars().ForgetPixels();
+}
+
+void Dataset::BeginSidecars()
+{
+    GetSidecars();
+    mbSidecarsWritten = true;
+}
+
+void Dataset::CheckLacking(bool bLacking, const char* pWhat, const Place& oPlace) const
+{
+    CheckWritingBeside(pWhat, oPlace);
+    if (!bLacking)
+        Refuse(std::string(pWhat) + ": the file itself says it, and its format cannot change it", oPlace);
+}
+
+// What the record has and the sidecar has not is the file's own.
+void Dataset::WriteTagsBeside(const krv::datasources::AuxiliaryData& oData)
+{
+    using krv::datasources::MetadataMap;
+    const Place oPlace = Place::Current();
+    constexpr const char* WHAT = "metadata cannot be written";
+    CheckLacking(true, WHAT, oPlace);
+    if (oData.GetChannelCount() != GetChanCount())
+        Refuse("the metadata are those of " + std::to_string(oData.GetChannelCount()) + " channels, not of " +
+                   std::to_string(GetChanCount()),
+               oPlace);
+    const krv::datasources::AuxiliaryData oShown = ReadAuxiliaryData();
+    AuxXml oAuxXml = GetSidecars().GetAuxXml();
+    krv::datasources::AuxiliaryData oTags = oData, oBeside = oAuxXml.GetTags();
+    const auto TakeOwn = [&](const MetadataMap& oAll, const MetadataMap& oThere, MetadataMap oNew)
+    {
+        for (const auto& [key, value] : oAll)
+        {
+            const auto oFound = oThere.find(key);
+            const auto oWanted = oNew.find(key);
+            if (oFound != oThere.end() && oFound->second == value)
+                continue;
+            CheckLacking(oWanted != oNew.end() && oWanted->second == value, WHAT, oPlace);
+            oNew.erase(key);
+        }
+        return oNew;
+    };
+    oTags.SetFileMetadata(TakeOwn(oShown.GetFileMetadata(), oBeside.GetFileMetadata(), oData.GetFileMetadata()));
+    for (unsigned int nChannel = 1; nChannel <= GetChanCount(); ++nChannel)
+    {
+        oTags.SetChanMetadata(TakeOwn(oShown.GetChanMetadata(nChannel), oBeside.GetChanMetadata(nChannel),
+                                      oData.GetChanMetadata(nChannel)),
+                              nChannel);
+        const std::string own = oShown.GetChannelDescription(nChannel);
+        const bool bOwn = !own.empty() && own != oBeside.GetChannelDescription(nChannel);
+        CheckLacking(!bOwn || own == oData.GetChannelDescription(nChannel), WHAT, oPlace);
+        if (bOwn)
+            oTags.SetChannelDescription("", nChannel);
+    }
+    oAuxXml.SetTags(oTags);
+    GetSidecars().SetAuxXml(std::move(oAuxXml));
+}
+
+void Dataset::WriteCRSBeside(const krv::ogc::cs::ICRS& oCRS)
+{
+    CheckLacking(GetNeeds().mbCRS, "the reference system cannot be written", Place::Current());
+    AuxXml oAuxXml = GetSidecars().GetAuxXml();
+    oAuxXml.SetCRS(oCRS.GetWKT());
+    GetSidecars().SetAuxXml(std::move(oAuxXml));
+}
+
+void Dataset::WriteGeocodingBeside(const krv::ogc::cs::GeocodingInfo& oInfo)
+{
+    const Place oPlace = Place::Current();
+    CheckLacking(GetNeeds().mbGeocoding, "the geocoding cannot be written", oPlace);
+    if (!oInfo.IsInvertible())
+        Refuse("a geocoding without an inverse cannot be written", oPlace);
+    AuxXml oAuxXml = GetSidecars().GetAuxXml();
+    oAuxXml.SetGeocoding(oInfo);
+    GetSidecars().SetAuxXml(std::move(oAuxXml));
 }
 
 krv::datasources::FileAccessState Dataset::Delete()
@@ -130,8 +226,15 @@ krv::datasources::FileAccessState Dataset::Delete()
     if (mpoWriter)
         mpoWriter->Discard();
     Close();
-    if ((mpoWriter && !mpoWriter->IsNamed()) || std::remove(moName.c_str()) == 0)
+    if (mpoWriter && !mpoWriter->IsNamed())
         return krv::datasources::eDone;
+    const std::vector<std::string> oCompanions = ListCompanions(moName);
+    if (std::remove(moName.c_str()) == 0)
+    {
+        for (const std::string& companion : oCompanions)
+            std::remove(companion.c_str());
+        return krv::datasources::eDone;
+    }
     return errno == ENOENT ? krv::datasources::eNotFound : krv::datasources::eDenied;
 }
 
@@ -169,15 +272,28 @@ bool Dataset::IsLinked() const
 void Dataset::Synchronize()
 {
     CheckOpen();
-    if (mpoWriter)
+    Store(false);
+}
+
+// The file first: what lies beside is to be younger than it.
+void Dataset::Store(bool bLast)
+{
+    if (mpoSidecars)
+        mpoSidecars->CheckStore();
+    if (mpoWriter && bLast)
+        mpoWriter->Finish();
+    else if (mpoWriter)
         mpoWriter->Synchronize();
+    if (mpoSidecars && WritesBeside())
+        mpoSidecars->Store();
 }
 
 void Dataset::Close()
 {
-    if (mpoWriter && !mpoWriter->IsEnded())
-        mpoWriter->Finish();
+    if (mbOpen && (!mpoWriter || !mpoWriter->IsEnded()))
+        Store(true);
     mbOpen = false;
+    mbSidecarsWritten = false;
     mpoSidecars.reset();
     mpoImage.reset();
 }

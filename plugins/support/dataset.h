@@ -27,7 +27,8 @@ namespace krv::plugins::support
 class Dataset : public krv::datasources::IDataset,
                 public krv::datasources::IRasterDataset,
                 public krv::datasources::INewFileDataset,
-                public krv::datasources::ISidecarDataset
+                public krv::datasources::ISidecarDataset,
+                public krv::datasources::ISidecarWriting
 {
 public:
     // poFormat: the builder's, kept as a pointer. Operations that need the image throw DataException until SetImage.
@@ -39,7 +40,7 @@ public:
     Dataset& operator=(const Dataset&) = delete;
 
     krv::datasources::IFileFormat* GetFileFormat() const override { return mpoFormat; }
-    // Closes the dataset and removes the file.
+    // Closes the dataset and removes the file, with the levels, masks and tags beside it.
     krv::datasources::FileAccessState Delete() override;
     // A new file exists from Create on, though it has its name only after Synchronize.
     bool Exists() const override;
@@ -72,18 +73,28 @@ public:
 
     // Nothing before there is an image.
     std::vector<krv::datasources::Sidecar> ListSidecars() override;
+    void BeginSidecars() override;
+    void WriteTagsBeside(const krv::datasources::AuxiliaryData& oData) override;
+    void WriteCRSBeside(const krv::ogc::cs::ICRS& oCRS) override;
+    void WriteGeocodingBeside(const krv::ogc::cs::GeocodingInfo& oInfo) override;
 
     // For what stands on the dataset.
     const std::string& GetFileName() const { return moName; }
     // Throws the DataException of a change to a file that is only read or has no image yet. pWhat: as for Refuse.
     void CheckWriting(const char* pWhat, const Place& oPlace) const;
+    // The same for what lies beside the file.
+    void CheckWritingBeside(const char* pWhat, const Place& oPlace) const;
+    bool WritesBeside() const { return IsWritten() || mbSidecarsWritten; }
+    // Whether the file is new or changed.
+    bool IsWritten() const { return mpoWriter != nullptr; }
+    // The files beside the file: a format asks them for what its own does not say, and changes of them are stored with
+    // the file's. Throws as GetImage.
+    Sidecars& GetSidecars() const;
 
 protected:
     // For the destructor of a dataset whose members the writer asks: warns when changes are lost, unless an exception
     // is on its way, which says more, and discards them.
     void Abandon() const noexcept;
-    // Whether the file is new or changed.
-    bool IsWritten() const { return mpoWriter != nullptr; }
     // Whether it lies under its own name.
     bool IsNamed() const { return !mpoWriter || mpoWriter->IsNamed(); }
     // Throws DataException unless the image of a new file is to be laid out, and can be. bEmpty: without channels too.
@@ -98,20 +109,26 @@ protected:
     // For further images of the dataset: levels, bitmaps.
     const std::shared_ptr<BlockCache>& GetCache() const { return mpoCache; }
     void CheckOpen(const Place& oPlace = Place::Current()) const;
-    // The files beside the file: a format asks them for what its own does not say. Throws as GetImage.
-    Sidecars& GetSidecars() const;
-    // What that is; nothing unless overridden.
+    // For the format to call before pixels of the image change: what lies beside says nothing of their values any more.
+    // The record of a file that has no name yet is that of the pixels to come.
+    void ForgetPixelsBeside();
+    // What is asked of the files beside; nothing unless overridden.
     virtual Sidecars::Needs GetNeeds() const { return {}; }
     // Throws the DataException of an operation that the format lacks. what: such as "channels cannot be deleted".
     [[noreturn]] void Refuse(const std::string& what, const Place& oPlace = Place::Current()) const;
 
 private:
+    void Store(bool bLast);
+    // Throws the DataException that the file itself says something, unless it does not.
+    void CheckLacking(bool bLacking, const char* pWhat, const Place& oPlace) const;
+
     std::string moName;
     krv::datasources::IFileFormat* mpoFormat;
     std::shared_ptr<BlockCache> mpoCache;
     std::shared_ptr<BlockImage> mpoImage;
     mutable std::unique_ptr<Sidecars> mpoSidecars;
     std::shared_ptr<FileWriter> mpoWriter; // null when the file is only read
+    bool mbSidecarsWritten = false;
     bool mbOpen = true;
     int mnExceptions = std::uncaught_exceptions();
 };

@@ -11,7 +11,23 @@ namespace krv::plugins::support
 void RecordDataset::ShowRecord(RecordText oRecord)
 {
     moRecord = std::move(oRecord);
-    moGeocoding = moRecord.GetGeocoding();
+    moGeocoding.reset();
+}
+
+Sidecars::Needs RecordDataset::GetNeeds() const
+{
+    return {true, !moRecord.HasGeocoding(), moRecord.GetDefinition().empty(), true};
+}
+
+const krv::ogc::cs::GeocodingInfo& RecordDataset::GetGeocoding() const
+{
+    if (!moGeocoding)
+    {
+        moGeocoding = moRecord.GetGeocoding();
+        if (HasImage() && !moRecord.HasGeocoding())
+            moGeocoding = GetSidecars().ReadGeocoding().value_or(*moGeocoding);
+    }
+    return *moGeocoding;
 }
 
 void RecordDataset::Change(RecordText oRecord) const
@@ -24,7 +40,9 @@ void RecordDataset::Change(RecordText oRecord) const
 krv::datasources::AuxiliaryData RecordDataset::ReadAuxiliaryData()
 {
     GetImage();
-    return moRecord.moTags;
+    krv::datasources::AuxiliaryData oTags = moRecord.moTags;
+    GetSidecars().AddTags(oTags);
+    return oTags;
 }
 
 void RecordDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData)
@@ -42,7 +60,10 @@ void RecordDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oD
 
 krv::ogc::cs::ICRS* RecordDataset::ReadCRS() const
 {
-    return moRecord.GetCRS().release();
+    auto poCRS = moRecord.GetCRS();
+    if (poCRS == nullptr && HasImage())
+        poCRS = GetSidecars().ReadCRS();
+    return poCRS.release();
 }
 
 void RecordDataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
@@ -103,6 +124,7 @@ void RecordDataset::ForgetOldPixels()
 {
     if (mbForgotten && (!IsNamed() || mbForgottenNamed))
         return;
+    ForgetPixelsBeside();
     RecordText oRecord = moRecord;
     bool bNews = IsNamed() && krv::datasources::DropStatistics(oRecord.moTags);
     for (const auto& [nLevel, nPlace] : moRecord.moLevels)

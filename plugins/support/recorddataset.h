@@ -7,13 +7,14 @@
 #include "plugins/support/writing/recordtext.h"
 
 #include <map>
+#include <optional>
 
 namespace krv::plugins::support
 {
 
 // A dataset whose metadata, reference system, geocoding and directory of levels are one record: a format says where
-// that is kept, as text or in another form, and where the pixels are. Levels can be made as long as the file is
-// written.
+// that is kept, as text or in another form, and where the pixels are. Files beside add what the record lacks. Levels
+// can be made as long as the file is written.
 class RecordDataset : public Dataset,
                       public krv::datasources::IGeocodedDataset,
                       public krv::datasources::IPlaceRemoval,
@@ -25,7 +26,7 @@ public:
     void WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override;
     krv::ogc::cs::ICRS* ReadCRS() const override;
     void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;
-    const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override { return moGeocoding; }
+    const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override;
     void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) override;
     void RemoveCRS() override;
     void RemoveGeocoding() override;
@@ -34,6 +35,7 @@ public:
 protected:
     using Dataset::Dataset;
 
+    Sidecars::Needs GetNeeds() const override;
     // What the file says when it is opened, or an empty one of so many channels as it has.
     void ShowRecord(RecordText oRecord);
     const RecordText& GetRecord() const { return moRecord; }
@@ -43,6 +45,8 @@ protected:
     // For the format to call before pixels of the image change: makes the levels outdated, and once the file has its
     // name what is recorded of their values. Costs nothing when it did so already.
     void ForgetOldPixels();
+    // One of those that there are.
+    std::shared_ptr<BlockImage> OpenLevel(unsigned int nLevel) override;
     // A level is opened anew when it is wanted next.
     void ForgetOpened() { moOpened.clear(); }
 
@@ -57,7 +61,6 @@ protected:
 
 private:
     std::vector<Level> GetLevels() const override;
-    std::shared_ptr<BlockImage> OpenLevel(unsigned int nLevel) override;
     const krv::datasources::AuxiliaryData& GetBook() const override { return moRecord.moTags; }
     void MakeLevel(const Level& oLevel, const krv::datasources::AuxiliaryData& oBook, const Place& oPlace) override;
     void DropLevel(unsigned int nLevel, const krv::datasources::AuxiliaryData& oBook, const Place& oPlace) override;
@@ -68,8 +71,8 @@ private:
     mutable RecordText moRecord;
     mutable bool mbForgotten = false; // what was known of the pixels before the last change
     bool mbForgottenNamed = false;    // while the file had its name
-    krv::ogc::cs::GeocodingInfo moGeocoding;
-    std::map<unsigned int, std::shared_ptr<BlockImage>> moOpened; // levels
+    mutable std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding; // the record's or that of a file beside
+    std::map<unsigned int, std::shared_ptr<BlockImage>> moOpened;   // levels
 };
 
 } // namespace krv::plugins::support

@@ -27,8 +27,9 @@ std::vector<unsigned int> TifDataset::GetBitmapList() const
     for (const PageSummary& oMask : GetPages().moMasks)
         oList.push_back(oMask.mnNumber);
     std::sort(oList.begin(), oList.end());
-    if (!HasOwnMask() && GetSidecars().HasMask())
-        oList.push_back(MASK_BESIDE);
+    if (!HasOwnMask())
+        for (const unsigned int nMask : GetSidecars().ListMasks())
+            oList.push_back(support::FIRST_BESIDE + nMask);
     return oList;
 }
 
@@ -37,6 +38,12 @@ bool TifDataset::HasOwnMask() const
     return GetLevelBitmap() != 0 ||
            std::any_of(GetPages().moMasks.begin(), GetPages().moMasks.end(),
                        [](const PageSummary& oMask) { return oMask.mbMask && !oMask.mbDescribed; });
+}
+
+unsigned int TifDataset::FindBeside(unsigned int nBitmap) const
+{
+    const unsigned int nMask = nBitmap > support::FIRST_BESIDE ? nBitmap - support::FIRST_BESIDE : 0;
+    return nMask != 0 && !HasOwnMask() && GetSidecars().HasMask(nMask) ? nMask : 0;
 }
 
 const PageSummary& TifDataset::GetMask(unsigned int nBitmap, const Place& oPlace) const
@@ -54,8 +61,8 @@ krv::datasources::IRasterIO* TifDataset::GetBitmapIO(const std::vector<unsigned 
 {
     std::vector<std::unique_ptr<krv::datasources::IRasterIO>> oParts;
     for (unsigned int nBitmap : oBitmaps)
-        if (IsBeside(nBitmap) && GetSidecars().HasMask())
-            oParts.emplace_back(GetSidecars().OpenMask(false));
+        if (const unsigned int nBeside = FindBeside(nBitmap))
+            oParts.emplace_back(GetSidecars().OpenMask(nBeside, false));
         else
             oParts.push_back(std::make_unique<support::RasterIO>(
                 OpenPage(GetMask(nBitmap, Place::Current()).mnOffset, PixelUse::eBitmap),
@@ -98,7 +105,7 @@ unsigned int TifDataset::CreateBitmap()
     const Place oPlace = Place::Current();
     FileEditor& oEditor = GetEditor("bitmaps cannot be added", oPlace);
     std::vector<unsigned int> oList = GetBitmapList();
-    std::erase_if(oList, [this](unsigned int nBitmap) { return IsBeside(nBitmap); });
+    std::erase_if(oList, [this](unsigned int nBitmap) { return FindBeside(nBitmap) != 0; });
     if (!oList.empty() && oList.back() == UINT_MAX)
         Refuse("the numbers of bitmaps are used up", oPlace);
     const unsigned int nBitmap = oList.empty() ? 1 : oList.back() + 1;
@@ -108,8 +115,8 @@ unsigned int TifDataset::CreateBitmap()
 
 std::string TifDataset::GetBitmapDescription(unsigned int nBitmap) const
 {
-    if (IsBeside(nBitmap) && GetSidecars().HasMask())
-        return {};
+    if (const unsigned int nBeside = FindBeside(nBitmap))
+        return GetSidecars().DescribeMask(nBeside);
     const PageSummary& oMask = GetMask(nBitmap, Place::Current());
     if (oMask.mbDescribed)
         return ReadPageMetadata(oMask.mnOffset).GetFileMetadataValue("ImageDescription");
@@ -143,8 +150,8 @@ void TifDataset::SetBitmapDescription(unsigned int nBitmap, const std::string& o
 
 krv::datasources::MetadataMap TifDataset::GetBitmapMetadata(unsigned int nBitmap) const
 {
-    if (IsBeside(nBitmap) && GetSidecars().HasMask())
-        return {};
+    if (const unsigned int nBeside = FindBeside(nBitmap))
+        return GetSidecars().GetMaskTags(nBeside);
     krv::datasources::MetadataMap oMap =
         ReadPageMetadata(GetMask(nBitmap, Place::Current()).mnOffset).GetFileMetadata();
     for (const char* pKey : MASK_KEYS)

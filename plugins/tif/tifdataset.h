@@ -2,7 +2,7 @@
 
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/iblockencoding.h"
-#include "datasources/interfaces/iencodedblocks.h"
+#include "datasources/interfaces/iblocktransfer.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ilayoutdataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
@@ -44,7 +44,8 @@ class TifDataset : public support::Dataset,
                    public krv::datasources::IPlaceRemoval,
                    public krv::datasources::ILayoutDataset,
                    public krv::datasources::IEncodedBlocks,
-                   public krv::datasources::IBlockEncoding
+                   public krv::datasources::IBlockEncoding,
+                   public krv::datasources::IBlockTransfer
 {
 public:
     // Throws krv::FileException kinds that name file and cause; nothing stays open then.
@@ -118,15 +119,14 @@ public:
     void StoreEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock, const unsigned char* pBytes,
                       std::size_t nBytes) override;
     krv::datasources::IBlockEncoder* MakeBlockEncoder(unsigned int nLevel) override;
+    bool TakeBlocks(unsigned int nLevel, krv::datasources::IDataset& oSource,
+                    const std::vector<krv::datasources::BlockNumber>& oBlocks) override;
 
 protected:
     support::Sidecars::Needs GetNeeds() const override;
 
 private:
     class Levels;
-
-    // The number of a mask that lies beside the file, shown where the file has no validity mask of its own.
-    static constexpr unsigned int MASK_BESIDE = 65536;
 
     // The other pages by what they are to the first one.
     struct PageTable
@@ -161,7 +161,8 @@ private:
     Page& GetPage(const Place& oPlace = Place::Current()) const;
     const PageTable& GetPages() const;
     bool HasOwnMask() const;
-    bool IsBeside(unsigned int nBitmap) const { return nBitmap == MASK_BESIDE && !HasOwnMask(); }
+    // The mask beside the file that a bitmap is, which there is where the file has no validity mask of its own; else 0.
+    unsigned int FindBeside(unsigned int nBitmap) const;
     const PageSummary& GetMask(unsigned int nBitmap, const Place& oPlace) const;
     void CheckPCT(unsigned int nPCT, const Place& oPlace) const;
     krv::datasources::AuxiliaryData ReadRecord() const;
@@ -170,6 +171,10 @@ private:
     // What a level's page is known by, and the page as its blocks are read.
     std::uint64_t FindLevelPage(unsigned int nLevel, const Place& oPlace) const;
     std::shared_ptr<Page> GetCodedPage(unsigned int nLevel, const Place& oPlace);
+    // Where the bytes of a block lie in the file; none are there of one that is not stored.
+    CodedStrile FindCoded(Page& oPage, const krv::datasources::BlockNumber& oBlock, const Place& oPlace) const;
+    // Has the page of a level store blocks as bytes.
+    void StoreCoded(unsigned int nLevel, const std::function<void(PageWriter& oWriter)>& oStore, const Place& oPlace);
 
     std::unique_ptr<support::LevelStore> mpoLevels;
     std::unique_ptr<support::LevelStore> mpoMaskLevels;

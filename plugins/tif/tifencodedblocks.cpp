@@ -1,4 +1,5 @@
 // The blocks of a TIFF file as bytes: the facets IEncodedBlocks and IBlockEncoding of its dataset.
+#include "datasources/metadata/levelbook.h"
 #include "plugins/tif/reading/pagesource.h"
 #include "plugins/tif/tifdataset.h"
 #include "plugins/tif/writing/blockencoder.h"
@@ -10,18 +11,6 @@
 
 namespace krv::plugins::tif
 {
-
-namespace
-{
-
-// Whether the sides of an image and of its level are those of the level's number.
-bool IsReduced(std::uint64_t nFull, std::uint64_t nReduced, unsigned int nLevel)
-{
-    const std::uint64_t nDown = nFull / nLevel;
-    return nLevel == 1 ? nReduced == nFull : nReduced != 0 && nReduced <= nDown + 1 && nReduced + 1 >= nDown;
-}
-
-} // namespace
 
 // By the editor's number, or for a file that is only read by its place; 0 for the image of such a file.
 std::uint64_t TifDataset::FindLevelPage(unsigned int nLevel, const Place& oPlace) const
@@ -53,25 +42,31 @@ krv::datasources::EncodedForm TifDataset::GetEncodedForm(unsigned int nLevel)
     return DescribeBlocks(*GetCodedPage(nLevel, Place::Current()));
 }
 
+CodedStrile TifDataset::FindCoded(Page& oPage, const krv::datasources::BlockNumber& oBlock, const Place& oPlace) const
+{
+    const std::uint64_t nNumber = GetStrile(oPage, oBlock, oPlace);
+    const Strile oStrile = oPage.GetStriles().Get(nNumber);
+    const std::uint64_t nSize = oPage.GetFile().GetSize();
+    if (oStrile.mnBytes != 0 && (oStrile.mnOffset > nSize || oStrile.mnBytes > nSize - oStrile.mnOffset))
+        oPage.Fail("the file is truncated: block " + std::to_string(oBlock.mnColumn) + ", " +
+                   std::to_string(oBlock.mnRow) + " reaches behind the end");
+    const PageForm& oForm = oPage.GetForm();
+    return {nNumber, oStrile.mnOffset,
+            std::min<std::uint64_t>(oStrile.mnBytes, GetLargestCoded(oForm, oForm.GetStrileRows(oBlock.mnRow)))};
+}
+
 bool TifDataset::ReadEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock,
                              std::vector<unsigned char>& oBytes)
 {
     const Place oPlace = Place::Current();
     Page& oPage = *GetCodedPage(nLevel, oPlace);
-    const PageForm& oForm = oPage.GetForm();
     if (mpoEditor)
         mpoEditor->StoreHeld();
-    const Strile oStrile = oPage.GetStriles().Get(GetStrile(oPage, oBlock, oPlace));
-    oBytes.clear();
-    if (oStrile.mnBytes == 0)
-        return false;
-    const std::uint64_t nSize = oPage.GetFile().GetSize();
-    if (oStrile.mnOffset > nSize || oStrile.mnBytes > nSize - oStrile.mnOffset)
-        oPage.Fail("the file is truncated: block " + std::to_string(oBlock.mnColumn) + ", " +
-                   std::to_string(oBlock.mnRow) + " reaches behind the end");
-    oBytes.resize(std::min(oStrile.mnBytes, GetLargestCoded(oForm, oForm.GetStrileRows(oBlock.mnRow))));
-    oPage.GetFile().Read(oStrile.mnOffset, oBytes.data(), oBytes.size());
-    return true;
+    const CodedStrile oCoded = FindCoded(oPage, oBlock, oPlace);
+    oBytes.resize(oCoded.mnBytes);
+    if (!oBytes.empty())
+        oPage.GetFile().Read(oCoded.mnOffset, oBytes.data(), oBytes.size());
+    return !oBytes.empty();
 }
 
 bool TifDataset::SetEncodedForm(unsigned int nLevel, const krv::datasources::EncodedForm& oForm)
@@ -86,7 +81,8 @@ bool TifDataset::SetEncodedForm(unsigned int nLevel, const krv::datasources::Enc
         Refuse("blocks are stored already", oPlace);
     oEditor.LoadTags(*poOld);
     const std::shared_ptr<PageModel> poNew = MakeEncodedPage(*poOld, oForm);
-    if (!poNew || !IsReduced(GetWidth(), oForm.mnWidth, nLevel) || !IsReduced(GetHeight(), oForm.mnHeight, nLevel))
+    if (!poNew || !krv::datasources::IsLevelSize(GetWidth(), oForm.mnWidth, nLevel) ||
+        !krv::datasources::IsLevelSize(GetHeight(), oForm.mnHeight, nLevel))
         return false;
     oEditor.LayOut(*poNew, oPlace);
     poNew->mnNumber = nNumber;
@@ -113,22 +109,56 @@ bool TifDataset::SetEncodedForm(unsigned int nLevel, const krv::datasources::Enc
     return true;
 }
 
+void TifDataset::StoreCoded(unsigned int nLevel, const std::function<void(PageWriter& oWriter)>& oStore,
+                            const Place& oPlace)
+{
+    GetEditor("blocks cannot be written", oPlace);
+    const std::uint64_t nNumber = FindLevelPage(nLevel, oPlace);
+    support::BlockImage& oImage = nLevel == 1 ? *GetImage(oPlace) : *OpenPage(nNumber, PixelUse::eImage);
+    const std::shared_ptr<PageWriter> poWriter = moWriters[nNumber].lock();
+    if (!poWriter)
+        Refuse("blocks of this image are only read", oPlace);
+    oStore(*poWriter);
+    oImage.DropBlocks();
+}
+
 void TifDataset::StoreEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock,
                               const unsigned char* pBytes, std::size_t nBytes)
 {
     const Place oPlace = Place::Current();
     GetEditor("blocks cannot be written", oPlace);
-    const std::uint64_t nNumber = FindLevelPage(nLevel, oPlace);
-    Page& oPage = *GetCodedPage(nLevel, oPlace);
-    const std::uint64_t nStrile = GetStrile(oPage, oBlock, oPlace);
+    const std::uint64_t nStrile = GetStrile(*GetCodedPage(nLevel, oPlace), oBlock, oPlace);
     if (pBytes == nullptr || nBytes == 0)
         Refuse("a block without bytes cannot be stored", oPlace);
-    support::BlockImage& oImage = nLevel == 1 ? *GetImage(oPlace) : *OpenPage(nNumber, PixelUse::eImage);
-    const std::shared_ptr<PageWriter> poWriter = moWriters[nNumber].lock();
-    if (!poWriter)
-        Refuse("blocks of this image are only read", oPlace);
-    poWriter->StoreCoded(nStrile, pBytes, nBytes);
-    oImage.DropBlocks();
+    StoreCoded(
+        nLevel, [&](PageWriter& oWriter) { oWriter.StoreCoded(nStrile, pBytes, nBytes); }, oPlace);
+}
+
+bool TifDataset::TakeBlocks(unsigned int nLevel, krv::datasources::IDataset& oSource,
+                            const std::vector<krv::datasources::BlockNumber>& oBlocks)
+{
+    const Place oPlace = Place::Current();
+    auto* const poSource = dynamic_cast<TifDataset*>(&oSource);
+    if (poSource == nullptr || poSource == this)
+        return false;
+    if (poSource->mpoEditor)
+        poSource->mpoEditor->StoreHeld();
+    GetEditor("blocks cannot be written", oPlace);
+    Page& oPage = *GetCodedPage(nLevel, oPlace);
+    Page& oFrom = *poSource->GetCodedPage(nLevel, oPlace);
+    std::vector<CodedStrile> oStriles;
+    for (const krv::datasources::BlockNumber& oBlock : oBlocks)
+    {
+        const std::uint64_t nStrile = GetStrile(oPage, oBlock, oPlace);
+        CodedStrile oCoded = poSource->FindCoded(oFrom, oBlock, oPlace);
+        oCoded.mnNumber = nStrile;
+        if (oCoded.mnBytes != 0)
+            oStriles.push_back(oCoded);
+    }
+    if (!oStriles.empty())
+        StoreCoded(
+            nLevel, [&](PageWriter& oWriter) { oWriter.CopyCoded(oFrom.GetFile(), oStriles); }, oPlace);
+    return true;
 }
 
 krv::datasources::IBlockEncoder* TifDataset::MakeBlockEncoder(unsigned int nLevel)

@@ -148,6 +148,7 @@ void TifDataset::WatchImage()
 
 void TifDataset::ForgetOldPixels()
 {
+    ForgetPixelsBeside();
     krv::datasources::AuxiliaryData oBook = GetBook(PixelUse::eImage);
     const std::shared_ptr<PageModel> poModel = mpoEditor->GetPages().front();
     const bool bStatistics = mpoEditor->IsNamed() && krv::datasources::DropStatistics(oBook);

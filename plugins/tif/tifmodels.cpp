@@ -37,7 +37,7 @@ RpcModel* ReadModelTag(const Page& oPage)
 
 std::vector<unsigned int> TifDataset::GetMathModelList() const
 {
-    std::vector<unsigned int> oList = support::FindModelSidecars(GetFileName());
+    std::vector<unsigned int> oList = GetSidecars().ListModels();
     if (!ReadDoubles(GetPage().GetTiff(), TAG_RPC).empty())
         oList.push_back(TAG_MODEL);
     return oList;
@@ -51,7 +51,7 @@ krv::mathmodel::IMathModel* TifDataset::GetMathModel(unsigned int nSegment)
         Refuse("there is no sensor model " + std::to_string(nSegment));
     if (nSegment == TAG_MODEL)
         return ReadModelTag(oPage);
-    return new RpcModel(support::ReadModelSidecar(GetFileName(), nSegment));
+    return new RpcModel(GetSidecars().ReadModel(nSegment));
 }
 
 unsigned int TifDataset::CreateMathModel(const krv::mathmodel::IMathModel& oModel)

@@ -2,11 +2,16 @@
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/ifileformat.h"
+#include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
+#include "datasources/interfaces/isidecardataset.h"
 #include "datasources/iomanager/datasetmanager.h"
+#include "datasources/iomanager/formatcapabilities.h"
+#include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/basicreader.h"
+#include "datasources/reader/validitysource.h"
 #include "datasources/writer/replacingwriter.h"
 #include "gobs/raster/raster.h"
 #include "gobs/raster/rasterinfo.h"
@@ -15,6 +20,8 @@
 #include "tests/support/recipe.h"
 #include "tests/support/thrown.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/ogc/cs/geocodinginfo.h"
+#include "toolkit/ogc/cs/icrs.h"
 #include "tools/conformance/conformance.h"
 #include "tools/conformance/tempfolder.h"
 
@@ -22,6 +29,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <filesystem>
 #include <memory>
 
@@ -55,6 +63,7 @@ struct FormatTraits
     bool mbOverviews;
     int mnFiles = 1; // of one image
     bool mbBitmaps = false;
+    bool mbWritesAfterFork = true; // in a process forked from one that wrote
     // Files of other programs are read in tests/plugins.
     void MakeFile(const std::string& file, const Image& oImage) const
     {
@@ -102,6 +111,9 @@ const FormatTraits FORMATS[] = {
      false,
      false,
      2},
+#ifdef KRV_PICTURES
+    {"GDBALL", "gdball", {"FTYPE:PNG", "FTYPE:PNG COMPRESSION=0"}, false, false, 1, false, false},
+#endif
     {"TIF",
      "tif",
      {"TILED=NO BLOCKYSIZE=17", "BLOCKXSIZE=64 BLOCKYSIZE=48 INTERLEAVE=BAND",
@@ -227,6 +239,120 @@ TEST_P(FormatConformance, BitmapsReadTheSameBeforeAndAfterTheyAreStored)
     }
 }
 
+// What a file cannot hold becomes the nearest value that it can, at once.
+TEST_P(FormatConformance, NarrowSamplesReadTheSameBeforeAndAfterTheyAreStored)
+{
+    const auto& oCan = DatasetManager::GetInstance()->GetCapabilities(GetParam().moShortName);
+    if (!oCan.IsSupported(CAPABILITY_NARROW_SAMPLES))
+        GTEST_SKIP() << "no narrow samples";
+    for (const auto& [eType, pBits] : {std::pair{krv::gobs::eDT_8U, "4"},
+                                       {krv::gobs::eDT_8S, "5"},
+                                       {krv::gobs::eDT_16U, "12"},
+                                       {krv::gobs::eDT_16S, "9"},
+                                       {krv::gobs::eDT_32R, "16"},
+                                       {krv::gobs::eDT_32R, "24"}})
+    {
+        SCOPED_TRACE(std::string("NBITS=") + pBits);
+        const DataType oType(eType);
+        if (oType.IsReal() && GetParam().moShortName != "TIF")
+            continue;
+        const std::string file = moFolder.File("narrow");
+        std::unique_ptr<IDataset> poDataset(DatasetManager::GetInstance()->NewDataset(
+            file, GetParam().moShortName, "BLOCKXSIZE=64 BLOCKYSIZE=64 NBITS=" + std::string(pBits)));
+        dynamic_cast<IRasterDataset&>(*poDataset).Create(300, 133, {oType, oType});
+        std::string part = RecipeImage(50, 40, {1, 2}, oType);
+        std::unique_ptr<IRasterIO> poIO(dynamic_cast<IRasterDataset&>(*poDataset).GetRasterIO({1, 2}));
+        poIO->WriteWindow(33u, 21u, 50u, 40u, reinterpret_cast<unsigned char*>(part.data()));
+        std::string held(part.size(), '?');
+        poIO->ReadWindow(33u, 21u, 50u, 40u, reinterpret_cast<unsigned char*>(held.data()));
+        EXPECT_FALSE(held == part) << "the recipe has values that do not fit";
+        poIO.reset();
+        poDataset->Close();
+        BasicReader oReader(file);
+        const std::unique_ptr<krv::gobs::Raster> poStored(oReader.ReadRaster(33, 21, 50, 40));
+        EXPECT_TRUE(std::string(reinterpret_cast<char*>(poStored->GetBuffer()), held.size()) == held);
+    }
+}
+
+// What lies beside a file adds what its own format has not said, and goes with it.
+TEST_P(FormatConformance, FilesWithCompanionsSayWhatTheseAdd)
+{
+    const std::string file = Make(Image());
+    const auto Open = [&file](AccessMode eMode = eReadOnly)
+    {
+        return std::unique_ptr<IDataset>(DatasetManager::GetInstance()->Open(file, eMode));
+    };
+    const auto MakeMask = [this](unsigned int nChannels)
+    {
+        Image oMask;
+        oMask.moTypes.assign(nChannels, krv::gobs::eDT_8U);
+        FORMATS[3].MakeFile(moFolder.File("sample.msk"), oMask);
+        return RecipeImage(300, 133, {nChannels}, krv::gobs::eDT_8U);
+    };
+    const auto ReadMask = [](IDataset& oDataset, unsigned int nBitmap)
+    {
+        std::string bits(std::size_t{300} * 133, '?');
+        const std::unique_ptr<IRasterIO> poIO(dynamic_cast<IBitmapDataset&>(oDataset).GetBitmapIO({nBitmap}));
+        poIO->ReadWindow(0u, 0u, 300u, 133u, reinterpret_cast<unsigned char*>(bits.data()));
+        return bits;
+    };
+    const auto ToBits = [](std::string bytes)
+    {
+        std::transform(bytes.begin(), bytes.end(), bytes.begin(), [](char n) { return n != 0 ? '\1' : '\0'; });
+        return bytes;
+    };
+    moFolder.Write("sample.wld", "2\n0\n0\n-2\n11\n19\n");
+    moFolder.Write("sample.prj", "EPSG:32633");
+    const std::string tags = "<PAMDataset><Metadata><MDI key='beside'>yes</MDI></Metadata><PAMRasterBand band='2'>"
+                             "<NoDataValue>7</NoDataValue><Metadata><MDI key='STATISTICS_MEAN'>1</MDI></Metadata>"
+                             "</PAMRasterBand></PAMDataset>";
+    moFolder.Write("sample.aux.xml", tags);
+    const std::string mask = ToBits(MakeMask(1));
+    {
+        const auto poDataset = Open();
+        EXPECT_TRUE(dynamic_cast<IGeocodedDataset&>(*poDataset).GetGeocoding() ==
+                    krv::ogc::cs::GeocodingInfo(10, 2, 0, 20, 0, -2));
+        EXPECT_EQ(std::unique_ptr<krv::ogc::cs::ICRS>(poDataset->ReadCRS())->GetEPSG(), 32633);
+        EXPECT_EQ(poDataset->ReadAuxiliaryData().GetFileMetadataValue("beside"), "yes");
+        EXPECT_EQ(poDataset->ReadAuxiliaryData().GetChanMetadataValue("NO_DATA_VALUE", 2), "7");
+        EXPECT_TRUE(ReadMask(*poDataset, FindValidityMask(dynamic_cast<IBitmapDataset&>(*poDataset))) == mask);
+        for (const Sidecar& oSidecar : dynamic_cast<ISidecarDataset&>(*poDataset).ListSidecars())
+            EXPECT_TRUE(oSidecar.mbUsed) << oSidecar.moFile;
+    }
+    const std::string third = ToBits(MakeMask(3));
+    {
+        const auto poDataset = Open();
+        auto& oBitmaps = dynamic_cast<IBitmapDataset&>(*poDataset);
+        EXPECT_EQ(FindValidityMask(oBitmaps), 0u);
+        const auto oMasks = FindChannelMasks(oBitmaps);
+        ASSERT_EQ(oMasks.size(), 3u);
+        EXPECT_TRUE(ReadMask(*poDataset, oMasks.at(3)) == third);
+        EXPECT_TRUE(ValiditySource(poDataset.get(), {3}).HasChannelMasks());
+    }
+    try
+    {
+        const auto poDataset = Open(eUpdate);
+        unsigned char nPixel = 1;
+        std::unique_ptr<IRasterIO>(dynamic_cast<IRasterDataset&>(*poDataset).GetRasterIO({1}))
+            ->WriteWindow(0u, 0u, 1u, 1u, &nPixel);
+        poDataset->Close();
+        EXPECT_EQ(Open()->ReadAuxiliaryData().GetChanMetadataValue("STATISTICS_MEAN", 2), "");
+        EXPECT_EQ(Open()->ReadAuxiliaryData().GetChanMetadataValue("NO_DATA_VALUE", 2), "7");
+    }
+    catch (const krv::DataException&)
+    {
+        EXPECT_EQ(ReadFile(moFolder.File("sample.aux.xml")), tags) << "the format updates no files";
+    }
+    moFolder.Write("sample.ovr", "levels of the old file");
+    Make(Image());
+    for (const char* pEnding : {".msk", ".aux.xml", ".ovr"})
+        EXPECT_FALSE(std::filesystem::exists(file + pEnding)) << "of the file that was replaced: " << pEnding;
+    EXPECT_TRUE(dynamic_cast<IBitmapDataset&>(*Open()).GetBitmapList().empty());
+    moFolder.Write("sample.aux.xml", tags);
+    EXPECT_EQ(Open()->Delete(), eDone);
+    EXPECT_FALSE(std::filesystem::exists(file + ".aux.xml"));
+}
+
 // Files of all formats side by side: the manager gives each to its own, whatever it is called.
 void Fill(BasicWriter& oWriter, unsigned char nValue)
 {
@@ -239,7 +365,7 @@ void Fill(BasicWriter& oWriter, unsigned char nValue)
 // What is not synchronised is lost with a warning, unless an exception says more.
 TEST_P(FormatConformance, WritersTakeFreeNamesAndReplaceWhenTheyAreToldTo)
 {
-    const std::string file = moFolder.File("new"), format = GetParam().moShortName;
+    const std::string file = moFolder.File("new.png"), format = GetParam().moShortName; // the generic format goes by it
     const auto Holds = [&](char nValue)
     {
         return krv::test::ReadPixels(BasicReader(file, {1})) == std::string(200, nValue);
@@ -292,6 +418,8 @@ TEST_P(FormatConformance, WritersTakeFreeNamesAndReplaceWhenTheyAreToldTo)
 // Of many processes that make one file one gets its name, whichever, and the others are told.
 TEST_P(FormatConformance, OneOfManyWritersGetsAName)
 {
+    if (!GetParam().mbWritesAfterFork)
+        GTEST_SKIP() << "its library's threads stay in the first process";
     for (int nRound = 0; nRound < 10; ++nRound)
     {
         const std::string file = moFolder.File("race" + std::to_string(nRound));

@@ -69,8 +69,8 @@ std::string MakeFile(const TempFolder& oFolder, unsigned int nFile)
                                           "COMPRESS=ZSTD BLOCKXSIZE=48 BLOCKYSIZE=80 INTERLEAVE=BAND",
                                           "COMPRESS=LZW PREDICTOR=YES TILED=NO", "BLOCKXSIZE=64 BLOCKYSIZE=64"};
     const bool bTif = nFile % 3 != 1;
-    const std::string fileName = oFolder.File(std::to_string(nFile) + (bTif ? ".tif" : ".demo"));
-    BasicWriter oWriter(fileName, {1, 2}, bTif ? "TIF" : "DEMO", bTif ? OPTIONS[nFile % 4] : "");
+    const std::string fileName = oFolder.File(std::to_string(nFile) + (bTif ? ".tif" : ".krv"));
+    BasicWriter oWriter(fileName, {1, 2}, bTif ? "TIF" : "KRVDSK", OPTIONS[bTif ? nFile % 4 : 0]);
     oWriter.CreateNewFile(krv::gobs::RasterInfo(WIDTH, HEIGHT, CHANNELS, krv::gobs::eDT_16U));
     WriteState(oWriter, nFile, 0);
     if (nFile % 5 == 0)

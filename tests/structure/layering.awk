@@ -28,15 +28,17 @@ BEGIN {
     opens["plugins/mosaic", "datasources/mosaic"] = 1;
 
     # Libraries of others, and the only folders that may know them.
-    home["^(xercesc|xalanc)/"] = "^(toolkit/xml|datasources/iomanager|datasources/formatregistrar)/";
+    home["^(xercesc|xalanc)/"] = "^(toolkit/xml|datasources/iomanager)/";
+    home["^expat\\.h"] = "^toolkit/xml/";
     home["^boost/"] = "^datasources/metadata/";
     home["^(proj\\.h|proj/)"] = "^toolkit/ogc/cs/";
     home["^(tiff|tiffio|geotiff|geo_|geokeys|geovalues|xtiffio)"] = "^(plugins/tif|plugins/support/geotiff|tools/samplescene)/";
-    home["^(libdeflate|zstd|lz4|lz4hc|zlib)\\.h"] = "^(plugins/support|plugins/tif|operations)/";
+    home["^(libdeflate|zstd|lz4|lz4hc|zlib|isa-l/crc)\\.h"] = "^(plugins/support|plugins/tif|operations)/";
     home["^openjpeg"] = "^plugins/jp2/";
     home["^(CLI|nlohmann)/"] = "^tools/";
     home["^fmt/"] = "^(operations|tools)/";
     home["^png\\.h"] = "^operations/";
+    home["^vips/"] = "^plugins/gdball/pictures/vips/";
     # Their traces in public headers, which everybody who includes them has to have installed.
     split("toolkit/xml/xmldocument.h toolkit/xml/xmlutil.h datasources/iomanager/xalanselect.h", names, " ");
     for (n in names)

@@ -50,9 +50,9 @@ std::string ParseFileError(const std::string& fileName)
     {
         krv::xml::ParseFile(fileName);
     }
-    catch (const xercesc::SAXParseException&)
+    catch (const krv::xml::ParseError& oError)
     {
-        return krv::xml::DescribeCurrentException();
+        return oError.what();
     }
     return "no exception";
 }
@@ -218,4 +218,5 @@ TEST(XmlTree, RefusesWhatNobodyVouchesFor)
 TEST(XmlTree, HonoursADeclaredEncoding)
 {
     EXPECT_EQ(Tree("<?xml version='1.0' encoding='ISO-8859-1'?><a>\xE9</a>").text, "\xC3\xA9");
+    EXPECT_EQ(Tree("<?xml version='1.0' encoding='windows-1252'?><a>\x80</a>").text, "\xE2\x82\xAC");
 }

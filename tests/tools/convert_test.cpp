@@ -20,6 +20,7 @@
 #include "tests/support/demofile.h"
 #include "tests/support/facts.h"
 #include "tests/support/pixels.h"
+#include "tests/support/telldataset.h"
 #include "tests/support/thrown.h"
 #include "tests/tools/programrun.h"
 #include "tools/conformance/tempfolder.h"
@@ -135,6 +136,29 @@ TEST(Convert, RealFilesKeepPixelsAndInformationInEveryLayout)
         EXPECT_EQ(json::diff(oKept, Kept(back)), json::array());
     }
     EXPECT_GT(nForm, 30U);
+}
+
+// There and back, in this process: pixels, tags, levels, masks, tables and models, of files with loss as they decode.
+TEST(Convert, RealFilesComeBackFromNativeFiles)
+{
+    const TempFolder oFolder;
+    const std::string there = oFolder.File("there.krv"), back = oFolder.File("back.tif");
+    unsigned int nFiles = 0;
+    for (const Facts& oRow : krv::test::GetFacts())
+    {
+        SCOPED_TRACE(oRow["file"]);
+        std::string told;
+        if (!krv::test::Error([&] { told = krv::test::TellDataset(*OpenFile(oRow.GetPath(), eReadOnly)); }).empty())
+            continue;
+        operations::Convert({{oRow.GetPath()}, {}, {}, {}}, {there, "", ""});
+        EXPECT_EQ(krv::test::TellDataset(*OpenFile(there, eReadOnly)), told);
+        operations::Convert({{there}, {}, {}, {}}, {back, "", ""});
+        EXPECT_EQ(krv::test::TellDataset(*OpenFile(back, eReadOnly)), told);
+        ++nFiles;
+    }
+    if (nFiles == 0)
+        GTEST_SKIP() << "no folder of real files";
+    EXPECT_GT(nFiles, 200U);
 }
 
 // Where two images, or levels of them, are stored in another way; empty when every byte of their blocks is the same.
@@ -482,7 +506,7 @@ TEST(Convert, FailuresLeaveNothingBehindAndTheOldFileAsItWas)
                                {{a, out, "--options", "PREDICTOR=3 COMPRESS=LZW"}, 2, "8U"},
                                {{a, out, "--window", "0,0,99999999999,5"}, 2, "above 4294967295"},
                                {{a, out, "--channels", ""}, 2, "--channels: the value is empty"},
-                               {{a, oFolder.File("out.png")}, 2, "extension .png"},
+                               {{a, oFolder.File("out.bmp")}, 2, "extension .bmp"},
                                {{a, oFolder.GetPath() + "/none/out.tif"}, 1, "there is no folder " + oFolder.GetPath()},
                                {{a, oFolder.GetPath()}, 1, "no plain file"}});
     // A file that ends in the middle of its pixels fails on the way.

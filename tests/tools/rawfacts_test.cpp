@@ -234,7 +234,6 @@ TEST(RealRawFiles, OthersAreRefusedWithTheirReason)
         {"raw/written/hand_short.dat", "is shorter than its header says: 15588 bytes in place of 15688"},
         {"raw/written/hand_short.hdr", "is shorter than its header says: 15588 bytes in place of 15688"},
         {"raw/plantcv/darkReference4.hdr", "\"interleave = bup\" is not bsq, bil or bip"},
-        {"raw/notenvi/384x256.hdr", "no format recognises this file"},
         {"raw/asc/lon_wrap_180.asc", "no format recognises this file"},
         {"raw/pyrate/roipac_test_trimmed.dem", "no format recognises this file"},
         {"raw/pyrate/20060619_utm.dem", "no format recognises this file"},

@@ -8,12 +8,21 @@
 namespace krv::xml
 {
 
-// What the exception that is being handled says, as one line of UTF-8, for the kinds that are no std::exception too:
-// those of the XML parser ("file:line:column: message") and of the XPath evaluation. "Unknown error" for any other. For
-// use in a catch block only, so that callers can report XML failures without the XML library's headers.
-KRV_TOOLKIT_API std::string DescribeCurrentException();
+// The half of the XML parser's own exception that programs see that know nothing of that library: what the parsers of
+// xmldocument.h throw is a xercesc::SAXParseException and one of these at once. what() is "file:line:column: message",
+// without the numbers where there are none.
+class KRV_TOOLKIT_API ParseError : public std::exception
+{
+public:
+    explicit ParseError(std::string description);
+    ParseError(const ParseError&);
+    ParseError& operator=(const ParseError&);
+    ~ParseError() override;
 
-// Whether an exception is the XML parser's: what the parsers of this folder throw is that and a std::exception at once.
-KRV_TOOLKIT_API bool IsParseException(const std::exception& oException);
+    const char* what() const noexcept override;
+
+private:
+    std::string moDescription;
+};
 
 } // namespace krv::xml

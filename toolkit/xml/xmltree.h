@@ -11,13 +11,14 @@
 namespace krv::xml
 {
 
-// One element of a small document, for those who need no XPath. All texts are UTF-8. Names keep their prefixes;
-// comments and processing instructions are left out. A plain value.
+// One element of a small document, for those who need no XPath. All texts are UTF-8. Names keep their prefixes, the
+// declarations of which are attributes; comments and processing instructions are left out. A plain value.
 struct KRV_TOOLKIT_API Element
 {
     std::string name;
-    std::vector<std::pair<std::string, std::string>> attributes; // in the order of the text
-    std::string text;                                            // all text directly inside, white space kept
+    std::vector<std::pair<std::string, std::string>>
+        attributes;   // in the order of the text, declarations of prefixes first
+    std::string text; // all text directly inside, white space kept
     std::vector<Element> children;
 
     Element();
@@ -35,10 +36,10 @@ struct KRV_TOOLKIT_API Element
 };
 
 // Parses a document from bytes that nobody vouches for and returns its root element. Zero bytes at the end are ignored,
-// since texts in files are often stored with their terminator. Starts XML support for the call when it is not started.
-// name stands in the messages. Throws krv::DataException naming the cause for anything malformed, any text that is not
-// valid in its encoding (UTF-8 unless declared otherwise), document type declarations and anything beyond limits.h; no
-// exception of another kind, no output.
+// since texts in files are often stored with their terminator. XML support (xmlutil.h) is not needed. name stands in
+// the messages. Throws krv::DataException naming the cause for anything malformed, any text that is not valid in its
+// encoding (UTF-8 unless UTF-16 or one with a byte for each character is declared), document type declarations and
+// anything beyond limits.h; std::bad_alloc; no exception of another kind, no output.
 KRV_TOOLKIT_API Element ParseTree(const char* poData, std::size_t nBytes, const std::string& name = "XML text");
 
 } // namespace krv::xml

@@ -16,6 +16,7 @@
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/rasterrange.h"
 #include "gobs/pct/pct.h"
+#include "toolkit/core/lettercase.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 #include "toolkit/ogc/cs/icrs.h"
@@ -304,6 +305,12 @@ void CheckIdentify(const Plugin& oPlugin, const std::string& sample, Findings& o
                         [&](const std::string& header)
                         { return header.size() > 3 && own.starts_with(header.substr(0, 4)); }))
             continue; // the plug-in's own
+        const auto IsFamily = [&family = family](const std::string& extension)
+        {
+            return krv::ToUpper(extension) == krv::ToUpper(family);
+        };
+        if (std::any_of(oExtensions.begin(), oExtensions.end(), IsFamily))
+            continue; // one of several kinds that are
         for (const std::string& header : headers)
         {
             Expect(oFindings, Identify(oPlugin, otherName, Padded(header)) != 0, "claims a file of the kind ", family);

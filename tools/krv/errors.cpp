@@ -1,6 +1,7 @@
 #include "tools/krv/errors.h"
 
 #include "datasources/formatregistrar/winformatregistrar.h"
+#include "operations/diagnosis/diagnosis.h"
 #include "operations/source/sourcefile.h"
 #include "toolkit/core/core.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -76,7 +77,11 @@ std::string FormatText(const krv::FileFormatException& oError)
 {
     const std::string& file = oError.GetFileName();
     if (oError.GetMessage().empty())
-        return fmt::format("{0}: no format recognises this file; try `krv doctor {0}`", file);
+    {
+        const std::string kind = operations::DescribeUnknown(file);
+        return fmt::format("{0}: no format recognises this file{1}{2}; try `krv doctor {0}`", file,
+                           kind.empty() ? "" : ": ", kind);
+    }
     const std::string message = WithFile(file, oError.GetMessage());
     const bool bSaid = message.find("is damaged") != std::string::npos || message.find("not read") != std::string::npos;
     const char* const pGuess = message.find("truncated") != std::string::npos
@@ -202,13 +207,17 @@ std::string Describe(const std::string& file, const krv::Exception** ppError)
     {
         return WithFile(file, "there is not enough memory; a smaller tile or size may do");
     }
+    catch (const krv::xml::ParseError& oError)
+    {
+        return XmlText(oError.what());
+    }
     catch (const std::exception& oError)
     {
-        return krv::xml::IsParseException(oError) ? XmlText(oError.what()) : WithFile(file, oError.what());
+        return WithFile(file, oError.what());
     }
     catch (...)
     {
-        return XmlText(krv::xml::DescribeCurrentException());
+        return WithFile(file, "unknown error");
     }
 }
 

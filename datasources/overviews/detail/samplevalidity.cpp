@@ -56,6 +56,9 @@ SampleValidity::SampleValidity(IRasterWriter& oWriter, const OverviewOptions& oO
             std::all_of(moNoData.begin(), moNoData.end(), [](const auto& oValue) { return oValue.has_value(); });
         if (oSource->HasBitmap() || oSource->HasAlpha() || (oSource->HasNoData() && !bAllSaid))
         {
+            for (unsigned int nPosition = 0; nPosition < oWriter.GetChansCount(); ++nPosition)
+                if (const IMaskBuilder* const poMask = oSource->GetChannelMask(nPosition))
+                    moChannels.push_back({nPosition, poMask});
             mpoOwned = std::move(oSource);
             mpoPixels = mpoOwned.get();
         }
@@ -81,7 +84,8 @@ void SampleValidity::AddChannels(const krv::gobs::DataType& oType, bool bNaN)
         if (!oValue)
             oValue = NoDataValue::FromReal(std::numeric_limits<double>::quiet_NaN());
         const ExactMaskDecision oDecision(krv::gobs::eAnyChannel, {*oValue}, {nChannel}, bAddNaN);
-        moChannels.push_back({nChannel - 1, std::make_unique<krv::gobs::MaskDecisionBuilder>(&oDecision)});
+        moComplex.push_back(std::make_unique<krv::gobs::MaskDecisionBuilder>(&oDecision));
+        moChannels.push_back({nChannel - 1, moComplex.back().get()});
     }
 }
 
@@ -158,7 +162,7 @@ void SampleValidity::MarkPixels(const krv::gobs::Raster& oRaster)
 
 void SampleValidity::MarkChannel(const krv::gobs::Raster& oRaster, const Channel& oChannel)
 {
-    const std::unique_ptr<Mask> oMask(oChannel.mpoNoData->BuildMask(oRaster));
+    const std::unique_ptr<Mask> oMask(oChannel.mpoBackground->BuildMask(oRaster));
     const std::size_t nPixels = oRaster.GetWidth();
     for (std::size_t n = 0; n < nPixels * moRows.size(); ++n)
         if (IsSet(oMask->GetBits(), n))

@@ -40,7 +40,7 @@ private:
     struct Channel
     {
         unsigned int mnPosition; // from 0
-        std::unique_ptr<const krv::gobs::IMaskBuilder> mpoNoData;
+        const krv::gobs::IMaskBuilder* mpoBackground;
     };
 
     void AddChannels(const krv::gobs::DataType& oType, bool bNaN);
@@ -54,7 +54,8 @@ private:
     std::unique_ptr<const krv::gobs::IMaskBuilder> mpoOwned;
     const krv::gobs::IMaskBuilder* mpoPixels = nullptr;
     std::unique_ptr<const krv::gobs::ISampleTest> mpoTest; // of plain types
-    std::vector<Channel> moChannels;                       // of complex ones
+    std::vector<Channel> moChannels;                       // of complex types, or with masks of their own
+    std::vector<std::unique_ptr<const krv::gobs::IMaskBuilder>> moComplex;
     unsigned int mnBitmap = 0;
     std::vector<unsigned char> moBytes;
     std::vector<unsigned char> moRows;

@@ -36,7 +36,7 @@ struct RasterCache::Core
     explicit Core(const CacheOptions& oOptions)
         : moOptions(oOptions),
           mpoOwnStore(oOptions.mnCeiling != 0 ? std::make_unique<TileStore>(oOptions.mnCeiling) : nullptr),
-          moTiles(mpoOwnStore != nullptr ? *mpoOwnStore : TileStore::Process())
+          moTiles(mpoOwnStore != nullptr ? *mpoOwnStore : TileStore::Process(), krv::cache::TileLayer::eDerived)
     {
     }
 

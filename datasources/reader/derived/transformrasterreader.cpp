@@ -12,6 +12,7 @@
 #include "gobs/raster/pixelvalue.h"
 #include "gobs/raster/raster.h"
 #include "gobs/resampling/gridmap.h"
+#include "gobs/resampling/gridrows.h"
 #include "gobs/resampling/interpolator.h"
 #include "gobs/resampling/nodatasamples.h"
 #include "toolkit/core/hblock.h"
@@ -421,25 +422,37 @@ private:
                     const InterpolationWindow& oWindow, unsigned char* pPixels, unsigned char* pValid,
                     std::size_t nPitch)
     {
-        const bool bScaled = oSamples.GetXFactor() != 1 || oSamples.GetYFactor() != 1;
-        moX.resize(oPart.mnWidth);
-        moY.resize(oPart.mnWidth);
         moRowValid.resize(oPart.mnWidth * mnChannels);
+        std::unique_ptr<krv::gobs::IGridRows> poRows;
+        if (mpoAffine != nullptr && mpoAffine->IsGrid())
+        {
+            MapRow(oPart, 0, oSamples);
+            poRows = krv::gobs::MakeGridRows(moSource.GetDataType(), mnChannels, moRule, oInterpolator, moX.data(),
+                                             oPart.mnWidth);
+        }
         for (std::size_t nRow = 0; nRow < oPart.mnHeight; ++nRow, pPixels += nPitch * GetPixelBytes())
         {
-            mpoMap->MapRow(oPart.mnX, oPart.mnY + static_cast<long long>(nRow), oPart.mnWidth, moX.data(), moY.data());
-            for (std::size_t n = 0; bScaled && n < oPart.mnWidth; ++n)
-            {
-                moX[n] /= oSamples.GetXFactor();
-                moY[n] /= oSamples.GetYFactor();
-            }
-            const bool bAll =
-                oInterpolator.Run(oWindow, moX.data(), moY.data(), oPart.mnWidth, pPixels, moRowValid.data());
+            MapRow(poRows != nullptr ? Part{oPart.mnX, oPart.mnY, 1, oPart.mnHeight} : oPart, nRow, oSamples);
+            const bool bAll = poRows != nullptr ? poRows->Run(oWindow, moY.front(), pPixels, moRowValid.data())
+                                                : oInterpolator.Run(oWindow, moX.data(), moY.data(), oPart.mnWidth,
+                                                                    pPixels, moRowValid.data());
             if (!bAll || mpoFinisher->ChangesValid())
                 mpoFinisher->Finish(pPixels, bAll ? nullptr : moRowValid.data(), oPart.mnWidth * mnChannels);
             if (pValid != nullptr)
                 NotePixels(bAll, oPart.mnWidth, pValid + nRow * nPitch);
         }
+    }
+
+    // The places of a row of a part in the samples.
+    void MapRow(const Part& oPart, std::size_t nRow, const Samples& oSamples)
+    {
+        moX.resize(oPart.mnWidth);
+        moY.resize(oPart.mnWidth);
+        mpoMap->MapRow(oPart.mnX, oPart.mnY + static_cast<long long>(nRow), oPart.mnWidth, moX.data(), moY.data());
+        for (std::size_t n = 0; oSamples.GetXFactor() != 1 && n < oPart.mnWidth; ++n)
+            moX[n] /= oSamples.GetXFactor();
+        for (std::size_t n = 0; oSamples.GetYFactor() != 1 && n < oPart.mnWidth; ++n)
+            moY[n] /= oSamples.GetYFactor();
     }
 
     void FillBackground(const Part& oPart, unsigned char* pPixels, unsigned char* pValid, std::size_t nPitch)

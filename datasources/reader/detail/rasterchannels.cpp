@@ -168,7 +168,8 @@ void RasterChannels::DropOwnedDataset()
 
 bool RasterChannels::HasLevels() const
 {
-    return !mbBitmaps && dynamic_cast<const IOverviewIO*>(moOpened.mpoRasterIO.get()) == nullptr;
+    return !mbBitmaps && dynamic_cast<const IRasterDataset*>(GetDataset()) != nullptr &&
+           dynamic_cast<const IOverviewIO*>(moOpened.mpoRasterIO.get()) == nullptr;
 }
 
 void RasterChannels::Read(krv::gobs::Raster& oRaster, eMarginBehaviour eBehaviour, const Place& oPlace)

@@ -307,6 +307,169 @@ inline PlainLoop FindForType(NativeDataTypeCode ePart, std::size_t nSamples)
     }
 }
 
+// All rows of a block of samples, whose sums stay in the nearest cache.
+template <typename T>
+inline void AddRows(const RowJob& oJob)
+{
+    constexpr std::size_t SAMPLES = 1024;
+    for (std::size_t nFrom = 0; nFrom < oJob.mnSums; nFrom += SAMPLES)
+    {
+        const std::size_t nSums = oJob.mnSums - nFrom < SAMPLES ? oJob.mnSums - nFrom : SAMPLES;
+        const T* p = reinterpret_cast<const T*>(oJob.mpPixels) + nFrom;
+        float* const __restrict pSums = oJob.mpSums + nFrom;
+        for (std::size_t n = 0; n < nSums; ++n)
+            pSums[n] = oJob.mpRowWeights[0] * static_cast<float>(p[n]);
+        for (std::size_t nRow = 1; nRow < oJob.mnRows; ++nRow)
+        {
+            p += oJob.mnRowSamples;
+            const float nWeight = oJob.mpRowWeights[nRow];
+            for (std::size_t n = 0; n < nSums; ++n)
+                pSums[n] += nWeight * static_cast<float>(p[n]);
+        }
+        if (oJob.mpLowest == nullptr)
+            continue;
+        p = reinterpret_cast<const T*>(oJob.mpPixels) + nFrom;
+        float* const __restrict pLowest = oJob.mpLowest + nFrom, * const __restrict pHighest = oJob.mpHighest + nFrom;
+        for (std::size_t n = 0; n < nSums; ++n)
+            pLowest[n] = pHighest[n] = static_cast<float>(p[n]);
+        for (std::size_t nRow = 1; nRow < oJob.mnRows; ++nRow)
+        {
+            p += oJob.mnRowSamples;
+            for (std::size_t n = 0; n < nSums; ++n)
+            {
+                const auto nValue = static_cast<float>(p[n]);
+                pLowest[n] = nValue < pLowest[n] ? nValue : pLowest[n];
+                pHighest[n] = nValue > pHighest[n] ? nValue : pHighest[n];
+            }
+        }
+    }
+}
+
+// What is no number stays so.
+inline Floats KeepTo(const Floats& oValue, const Floats& oLow, const Floats& oHigh)
+{
+    return LargerOf(oLow, SmallerOf(oHigh, oValue));
+}
+
+// Four samples of one pixel in the lanes.
+template <std::size_t N>
+inline Floats AddPixel(const RowJob& oJob, const Taps& oTaps, std::size_t nAt, std::size_t nTaps)
+{
+    const std::size_t nStep = N != 0 ? N : oJob.mnSamples;
+    const float* const pWeights = oJob.mpWeights + oTaps.mnWeights;
+    Floats oSum = Spread(pWeights[0]) * LoadSamples(oJob.mpSums + nAt);
+    for (std::size_t k = 1; k < nTaps; ++k)
+        oSum += Spread(pWeights[k]) * LoadSamples(oJob.mpSums + nAt + k * nStep);
+    if (oJob.mpLowest == nullptr)
+        return oSum;
+    Floats oLow = LoadSamples(oJob.mpLowest + nAt), oHigh = LoadSamples(oJob.mpHighest + nAt);
+    for (std::size_t k = 1; k < nTaps; ++k)
+    {
+        oLow = SmallerOf(oLow, LoadSamples(oJob.mpLowest + nAt + k * nStep));
+        oHigh = LargerOf(oHigh, LoadSamples(oJob.mpHighest + nAt + k * nStep));
+    }
+    return KeepTo(oSum, oLow, oHigh);
+}
+
+// Single samples of four pixels in the lanes.
+inline Floats AddFour(const RowJob& oJob, const Taps* pTaps, std::size_t nTaps)
+{
+    const auto Gather = [&](const float* p, std::size_t k)
+    {
+        return Floats{p[static_cast<std::size_t>(pTaps[0].mnFirst - oJob.mnFirst) + k],
+                      p[static_cast<std::size_t>(pTaps[1].mnFirst - oJob.mnFirst) + k],
+                      p[static_cast<std::size_t>(pTaps[2].mnFirst - oJob.mnFirst) + k],
+                      p[static_cast<std::size_t>(pTaps[3].mnFirst - oJob.mnFirst) + k]};
+    };
+    const auto Weights = [&](std::size_t k)
+    {
+        return Floats{oJob.mpWeights[pTaps[0].mnWeights + k], oJob.mpWeights[pTaps[1].mnWeights + k],
+                      oJob.mpWeights[pTaps[2].mnWeights + k], oJob.mpWeights[pTaps[3].mnWeights + k]};
+    };
+    Floats oSum = Weights(0) * Gather(oJob.mpSums, 0);
+    for (std::size_t k = 1; k < nTaps; ++k)
+        oSum += Weights(k) * Gather(oJob.mpSums, k);
+    if (oJob.mpLowest == nullptr)
+        return oSum;
+    Floats oLow = Gather(oJob.mpLowest, 0), oHigh = Gather(oJob.mpHighest, 0);
+    for (std::size_t k = 1; k < nTaps; ++k)
+    {
+        oLow = SmallerOf(oLow, Gather(oJob.mpLowest, k));
+        oHigh = LargerOf(oHigh, Gather(oJob.mpHighest, k));
+    }
+    return KeepTo(oSum, oLow, oHigh);
+}
+
+template <typename T, std::size_t N>
+inline void MakePixelsOf(const RowJob& oJob)
+{
+    T* pResult = reinterpret_cast<T*>(oJob.mpResult);
+    for (std::size_t n = 0; n < oJob.mnCount;)
+    {
+        const Taps* const pTaps = oJob.mpTaps + n;
+        const auto nTaps = static_cast<std::size_t>(pTaps[0].mnEnd - pTaps[0].mnFirst);
+        const auto HasAsMany = [&](std::size_t nOther)
+        {
+            return static_cast<std::size_t>(pTaps[nOther].mnEnd - pTaps[nOther].mnFirst) == nTaps;
+        };
+        if (N == 1 && n + 4 <= oJob.mnCount && HasAsMany(1) && HasAsMany(2) && HasAsMany(3))
+        {
+            StoreFour(pResult + n, AddFour(oJob, pTaps, nTaps));
+            n += 4;
+            continue;
+        }
+        const std::size_t nSamples = N != 0 ? N : oJob.mnSamples;
+        const std::size_t nAt = static_cast<std::size_t>(pTaps->mnFirst - oJob.mnFirst) * nSamples;
+        if constexpr (N != 0)
+            StorePixel<T, N>(pResult + n * N, AddPixel<N>(oJob, *pTaps, nAt, nTaps), n + 1 == oJob.mnCount);
+        else
+        {
+            for (std::size_t c = 0; c < nSamples; c += 4)
+            {
+                T aValues[4];
+                StoreFour(aValues, AddPixel<N>(oJob, *pTaps, nAt + c, nTaps));
+                std::memcpy(pResult + n * nSamples + c, aValues, (nSamples - c < 4 ? nSamples - c : 4) * sizeof(T));
+            }
+        }
+        ++n;
+    }
+}
+
+template <typename T>
+inline void MakePixels(const RowJob& oJob)
+{
+    switch (oJob.mnSamples)
+    {
+    case 1:
+        return MakePixelsOf<T, 1>(oJob);
+    case 2:
+        return MakePixelsOf<T, 2>(oJob);
+    case 3:
+        return MakePixelsOf<T, 3>(oJob);
+    case 4:
+        return MakePixelsOf<T, 4>(oJob);
+    default:
+        return MakePixelsOf<T, 0>(oJob);
+    }
+}
+
+inline RowLoops FindRowLoopsFor(NativeDataTypeCode ePart)
+{
+    switch (ePart)
+    {
+    case eDT_8U:
+        return {AddRows<std::uint8_t>, MakePixels<std::uint8_t>};
+    case eDT_16U:
+        return {AddRows<std::uint16_t>, MakePixels<std::uint16_t>};
+    case eDT_16S:
+        return {AddRows<std::int16_t>, MakePixels<std::int16_t>};
+    case eDT_32R:
+        return {AddRows<float>, MakePixels<float>};
+    default:
+        return {};
+    }
+}
+
 inline PlainLoop FindFor(Resampling eMethod, NativeDataTypeCode ePart, std::size_t nSamples)
 {
     if (eMethod == Resampling::eBilinear)

@@ -12,5 +12,10 @@ PlainLoop FindAvx2PlainLoop(Resampling eMethod, NativeDataTypeCode ePart, std::s
     return FindFor(eMethod, ePart, nSamples);
 }
 
+RowLoops FindAvx2RowLoops(NativeDataTypeCode ePart)
+{
+    return FindRowLoopsFor(ePart);
+}
+
 } // namespace krv::gobs::detail
 #endif

@@ -12,5 +12,10 @@ PlainLoop FindAvx512PlainLoop(Resampling eMethod, NativeDataTypeCode ePart, std:
     return FindFor(eMethod, ePart, nSamples);
 }
 
+RowLoops FindAvx512RowLoops(NativeDataTypeCode ePart)
+{
+    return FindRowLoopsFor(ePart);
+}
+
 } // namespace krv::gobs::detail
 #endif

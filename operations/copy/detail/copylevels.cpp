@@ -1,6 +1,7 @@
 #include "operations/copy/detail/copylevels.h"
 
 #include "datasources/interfaces/ibitmapdataset.h"
+#include "datasources/interfaces/iblocktransfer.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterio.h"
@@ -57,8 +58,10 @@ PixelWindow GetPart(const EncodedForm& oForm, const BlockNumber& oBlock)
 class BlockGrid
 {
 public:
+    // oForm: borrowed.
     explicit BlockGrid(const EncodedForm& oForm)
-        : mnColumns(DivideUp(oForm.mnWidth, oForm.mnBlockWidth)), mnRows(DivideUp(oForm.mnHeight, oForm.mnBlockHeight)),
+        : moForm(oForm), mnColumns(DivideUp(oForm.mnWidth, oForm.mnBlockWidth)),
+          mnRows(DivideUp(oForm.mnHeight, oForm.mnBlockHeight)),
           mnBlocks(std::uint64_t{oForm.mbSeparate ? oForm.mnChannels : 1} * mnColumns * mnRows)
     {
         const std::uint64_t nBytes = std::uint64_t{oForm.mnBlockWidth} * oForm.mnBlockHeight;
@@ -77,10 +80,19 @@ public:
         return oBlocks;
     }
 
+    // Of the pixels in a block.
+    std::uint64_t GetPixelBytes(const BlockNumber& oBlock) const
+    {
+        const PixelWindow oPart = GetPart(moForm, oBlock);
+        return krv::gobs::BufferBytes(oPart.width, oPart.height, moForm.mbSeparate ? 1 : moForm.mnChannels,
+                                      moForm.moType);
+    }
+
 private:
     static constexpr std::uint64_t RUN_PIXELS = std::uint64_t{1} << 20;
     static constexpr std::uint64_t MOST_RUN = 64;
 
+    const EncodedForm& moForm;
     std::uint64_t mnColumns;
     std::uint64_t mnRows;
     std::uint64_t mnBlocks;
@@ -91,9 +103,8 @@ private:
 struct MovedBlock
 {
     BlockNumber number;
-    std::uint64_t pixelBytes;
-    bool stored;
-    std::vector<unsigned char> bytes;
+    bool stored = false;
+    std::vector<unsigned char> bytes = {};
 };
 
 // What a thread fetches blocks with.
@@ -114,13 +125,10 @@ public:
 
     MovedBlock Read(const BlockNumber& oBlock)
     {
-        const PixelWindow oPart = GetPart(moForm, oBlock);
-        const unsigned int nChannels = moForm.mbSeparate ? 1 : moForm.mnChannels;
-        MovedBlock oMoved{
-            oBlock, krv::gobs::BufferBytes(oPart.width, oPart.height, nChannels, moForm.moType), false, {}};
+        MovedBlock oMoved{oBlock};
         oMoved.stored = moBlocks.ReadEncoded(mnLevel, oBlock, oMoved.bytes);
         if (oMoved.stored && !moPlanes.empty())
-            CheckPixels(moPlanes[oBlock.mnPlane].Get(), oPart);
+            CheckPixels(moPlanes[oBlock.mnPlane].Get(), GetPart(moForm, oBlock));
         return oMoved;
     }
 
@@ -207,14 +215,25 @@ private:
         if (poBlocks == nullptr)
             return false;
         EncodedForm oForm = poBlocks->GetEncodedForm(nLevel);
-        oForm.mnWidth = nWidth;
-        oForm.mnHeight = nHeight;
-        if (!oForm.mbWholeBlocks)
+        const auto Cut = [](unsigned int nBlock, unsigned int nOld, unsigned int nNew)
         {
-            oForm.mnBlockWidth = nWidth;
-            oForm.mnBlockHeight = std::min(oForm.mnBlockHeight, nHeight);
-        }
-        return poBlocks->SetEncodedForm(nLevel, oForm);
+            return nBlock == nOld ? nNew : std::min(nBlock, nNew);
+        };
+        const auto Set = [&](bool bWhole)
+        {
+            EncodedForm oNew = oForm;
+            oNew.mbWholeBlocks = bWhole;
+            oNew.mnWidth = nWidth;
+            oNew.mnHeight = nHeight;
+            if (!bWhole)
+            {
+                oNew.mnBlockWidth = Cut(oForm.mnBlockWidth, oForm.mnWidth, nWidth);
+                oNew.mnBlockHeight = Cut(oForm.mnBlockHeight, oForm.mnHeight, nHeight);
+            }
+            return poBlocks->SetEncodedForm(nLevel, oNew);
+        };
+        // Of some formats all blocks are whole in one size of a level, and end with it in another.
+        return Set(oForm.mbWholeBlocks) || (oForm.mbWholeBlocks && Set(false));
     }
 
     // The channels of each type by themselves.
@@ -318,6 +337,22 @@ void BuildLevels(const CopyPlan& oPlan, const Target& oTarget, const std::vector
     BuildOverviews(oWriter, oLevels, method, oOptions);
 }
 
+// From file to file, when the target knows the source's kind.
+bool TakeRuns(const SourceFile& oSource, const Target& oTarget, unsigned int nLevel, const BlockGrid& oGrid,
+              ProgressCounter& oCounter)
+{
+    auto* const poTransfer = oTarget.Find<IBlockTransfer>();
+    for (std::uint64_t nRun = 0; poTransfer != nullptr && nRun < oGrid.CountRuns(); ++nRun)
+    {
+        const std::vector<BlockNumber> oBlocks = oGrid.GetRun(nRun);
+        if (!poTransfer->TakeBlocks(nLevel, oSource.GetDataset(), oBlocks))
+            return false;
+        for (const BlockNumber& oBlock : oBlocks)
+            oCounter.Advance(oGrid.GetPixelBytes(oBlock));
+    }
+    return poTransfer != nullptr;
+}
+
 } // namespace
 
 void MoveBlocks(const CopyPlan& oPlan, const Target& oTarget, unsigned int nLevel)
@@ -329,6 +364,8 @@ void MoveBlocks(const CopyPlan& oPlan, const Target& oTarget, unsigned int nLeve
     ProgressCounter oCounter(oTarget.GetProgress(), nLevel == 1 ? "convert" : "overviews",
                              krv::gobs::BufferBytes(oForm.mnWidth, oForm.mnHeight, oForm.mnChannels, oForm.moType));
     const bool bCheck = oTarget.IsChecked() && oForm.moCodec != "NONE";
+    if (!bCheck && TakeRuns(oSource, oTarget, nLevel, oGrid, oCounter))
+        return;
     FileWorkers<BlockReader> oWorkers(
         oSource,
         [&](FilePointer poFile) { return std::make_unique<BlockReader>(std::move(poFile), oForm, nLevel, bCheck); });
@@ -349,7 +386,7 @@ void MoveBlocks(const CopyPlan& oPlan, const Target& oTarget, unsigned int nLeve
             {
                 if (oBlock.stored)
                     oTo.StoreEncoded(nLevel, oBlock.number, oBlock.bytes.data(), oBlock.bytes.size());
-                oCounter.Advance(oBlock.pixelBytes);
+                oCounter.Advance(oGrid.GetPixelBytes(oBlock.number));
             }
         });
 }

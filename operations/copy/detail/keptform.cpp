@@ -7,6 +7,7 @@
 
 #include <algorithm>
 #include <cctype>
+#include <functional>
 #include <sstream>
 
 namespace krv::operations::detail
@@ -136,12 +137,15 @@ std::vector<KeptOption> FindKeptOptions(const CopyPlan& oPlan, const std::string
                                     : fmt::format("strips of {} rows", oForm->mnBlockHeight),
                              blocks, ""});
     }
+    // Of channels of several types each has the predictor that goes with it.
+    const auto& oTypes = oPlan.GetTypes();
+    const bool bMixed = std::adjacent_find(oTypes.begin(), oTypes.end(), std::not_equal_to<>()) != oTypes.end();
     // JPEG has no narrow samples, differences of values neither.
     const unsigned int nBits = oPlan.GetNarrowBits();
     if (nBits != 0 && !Has("NBITS") && !Has("COMPRESS", "JPEG") && !Has("PREDICTOR", "2"))
         oKept.push_back({fmt::format("{} bits a sample", nBits), fmt::format("NBITS={}", nBits), ""});
     else if (oForm && !Has("COMPRESS") && !Has("PREDICTOR") && !oForm->mbLossy && oPlan.AreTypesKept() &&
-             oForm->moCodec != "NONE")
+             oForm->moCodec != "NONE" && !bMixed)
         oKept.push_back({oForm->mnPredictor == 1 ? "" : fmt::format("predictor {}", oForm->mnPredictor),
                          oForm->mnPredictor == 1 ? "PREDICTOR=NO" : fmt::format("PREDICTOR={}", oForm->mnPredictor),
                          ""});

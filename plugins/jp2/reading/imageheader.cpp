@@ -1,11 +1,11 @@
 #include "plugins/jp2/reading/imageheader.h"
 
+#include "plugins/support/file/iccprofile.h"
 #include "plugins/support/file/numbers.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
 #include <cmath>
-#include <cstring>
 
 namespace krv::plugins::jp2
 {
@@ -76,44 +76,6 @@ std::optional<Palette> ReadPalette(const std::vector<unsigned char>& oBytes)
     return oCursor.IsShort() ? std::nullopt : std::optional(std::move(oPalette));
 }
 
-// The name of an ICC profile: its description, as far as it is plain text.
-std::string ReadProfileName(const std::vector<unsigned char>& oBytes, std::size_t nBegin)
-{
-    constexpr std::size_t TAGS = 128;
-    const std::vector<unsigned char> oProfile(oBytes.begin() + static_cast<std::ptrdiff_t>(nBegin), oBytes.end());
-    if (oProfile.size() < TAGS + 4)
-        return {};
-    const std::size_t nTags = static_cast<std::size_t>(ReadNumber(oProfile.data() + TAGS, 4, true));
-    for (std::size_t nTag = 0; nTag < nTags && TAGS + 16 + 12 * nTag <= oProfile.size(); ++nTag)
-    {
-        const unsigned char* pTag = oProfile.data() + TAGS + 4 + 12 * nTag;
-        const std::uint64_t nOffset = ReadNumber(pTag + 4, 4, true), nSize = ReadNumber(pTag + 8, 4, true);
-        if (ReadNumber(pTag, 4, true) != BoxType("desc") || nSize < 28 || nOffset + nSize > oProfile.size())
-            continue;
-        const unsigned char* pText = oProfile.data() + nOffset;
-        std::string name;
-        if (ReadNumber(pText, 4, true) == BoxType("desc"))
-        {
-            const std::uint64_t nLength = std::min<std::uint64_t>(ReadNumber(pText + 8, 4, true), nSize - 12);
-            name.assign(pText + 12, pText + 12 + nLength);
-        }
-        else if (ReadNumber(pText, 4, true) == BoxType("mluc"))
-        {
-            const std::uint64_t nLength = ReadNumber(pText + 20, 4, true), nText = ReadNumber(pText + 24, 4, true);
-            if (nText + nLength <= nSize)
-                for (std::uint64_t nAt = 1; nAt < nLength; nAt += 2)
-                    name += static_cast<char>(pText[nText + nAt - 1] == 0 ? pText[nText + nAt] : '?');
-        }
-        name.resize(strnlen(name.c_str(), name.size()));
-        const auto IsPlain = [](char nLetter)
-        {
-            return nLetter >= ' ' && nLetter <= '~';
-        };
-        return std::all_of(name.begin(), name.end(), IsPlain) ? name : std::string();
-    }
-    return {};
-}
-
 void ReadColours(const std::vector<unsigned char>& oBytes, ImageHeader& oHeader)
 {
     constexpr std::uint32_t ENUMERATED = 1;
@@ -125,7 +87,10 @@ void ReadColours(const std::vector<unsigned char>& oBytes, ImageHeader& oHeader)
     if (nMethod == ENUMERATED)
         oHeader.mnColours = oCursor.Take(4);
     else
-        oHeader.moProfile = ReadProfileName(oBytes, oCursor.GetPlace());
+    {
+        const std::size_t nAt = std::min(oCursor.GetPlace(), oBytes.size());
+        oHeader.moProfile = support::ReadProfileName(oBytes.data() + nAt, oBytes.size() - nAt);
+    }
 }
 
 // Pixels per metre: a fraction and a power of ten.

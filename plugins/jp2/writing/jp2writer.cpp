@@ -170,7 +170,7 @@ void Jp2Writer::Store()
     support::NewFile oNew(GetFileName(), TakesPlace());
     WriteAll(*oNew.GetFile());
     oNew.GetFile()->Flush();
-    oNew.TakeName(TakesPlace());
+    TakeName(oNew);
     SetNamed();
     mbChanged = false;
 }

@@ -31,6 +31,8 @@ public:
     const krv::datasources::AuxiliaryData& GetRecord() const { return moRecord; }
     void SetRecord(const krv::datasources::AuxiliaryData& oRecord);
     const support::GeoTags& GetGeoTags() const { return moGeoTags; }
+    // Without them the file is a bare codestream, which has no place for records.
+    bool HasBoxes() const;
     void SetGeoTags(support::GeoTags oTags);
     const std::optional<krv::gobs::PCT>& GetPalette() const { return moPalette; }
     // Throws DataException for an image that is no single channel of unsigned samples.
@@ -41,7 +43,6 @@ protected:
     bool HoldsChanges() const override { return mbChanged; }
 
 private:
-    bool HasBoxes() const;
     std::vector<unsigned char> MakeBoxes() const;
     std::vector<unsigned char> MakeHeaderBox() const;
     std::vector<unsigned char> MakeMainHeader() const;

@@ -2,6 +2,7 @@
 
 #include "plugins/jp2/reading/decoder.h"
 #include "plugins/jp2/reading/samplecopy.h"
+#include "plugins/support/codec/bits.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/raster/interleave.h"
 
@@ -31,14 +32,22 @@ TileStore::TileStore(std::shared_ptr<support::File> poFile, TileEncoder oEncoder
     : mpoFile(std::move(poFile)), moEncoder(std::move(oEncoder)), moLayout(MakeLayout(moEncoder)),
       moBeforeWrite(std::move(oBeforeWrite)),
       moTiles(std::size_t{moLayout.GetBlocksAcross()} * ((moLayout.GetHeight() - 1) / moLayout.GetBlockHeight() + 1)),
-      mnEnd(FIRST_PLACE), moHeld(HELD_BYTES, moLayout.GetPixelBytes(0),
-                                 [this](const support::HeldBlocks::Block& oBlock, const unsigned char* pPixels)
-                                 {
-                                     if (mbCompleting)
-                                         Encode(oBlock.mnNumber, pPixels, GetPitch(oBlock.mnNumber));
-                                     else
-                                         PutAside(oBlock.mnNumber, pPixels);
-                                 })
+      mnEnd(FIRST_PLACE),
+      moHeld(
+          HELD_BYTES, moLayout.GetPixelBytes(0),
+          [this](const support::HeldBlocks::Block& oBlock, const unsigned char* pPixels)
+          {
+              if (mbCompleting)
+                  Encode(oBlock.mnNumber, pPixels, GetPitch(oBlock.mnNumber));
+              else
+                  PutAside(oBlock.mnNumber, pPixels);
+          },
+          [this](unsigned char* pPixels, std::size_t nBytes)
+          {
+              const ImageForm& oForm = moEncoder.GetForm();
+              const std::size_t nValueBytes = oForm.moType.GetBits() / 8;
+              codec::FitBits(pPixels, nBytes / nValueBytes, nValueBytes, oForm.mnBits, oForm.moType.IsSigned());
+          })
 {
 }
 

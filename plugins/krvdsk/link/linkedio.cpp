@@ -1,6 +1,7 @@
 #include "plugins/krvdsk/link/linkedio.h"
 
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/raster/interleave.h"
 
 #include <algorithm>
 
@@ -95,6 +96,18 @@ template <typename Base>
 void LinkedIOBase<Base>::WriteWindow(unsigned int, unsigned int, unsigned int, unsigned int, unsigned char* const)
 {
     RefuseWriting(*mpoLink, Place::Current());
+}
+
+void ReadBlockWindow(krv::datasources::IRasterIO& oIO, const BlockPart& oPart, unsigned char* pTarget,
+                     std::size_t nPitch, support::Scratch& oScratch)
+{
+    const support::PixelRect oRect = oPart.moLayout.GetBlockRect(oPart.moBlock.mnColumn, oPart.moBlock.mnRow);
+    const support::PixelRect& oWanted = oPart.moPart;
+    const std::size_t nRow = oWanted.mnWidth * oPart.moLayout.GetPixelBytes(oPart.moBlock.mnPlane);
+    unsigned char* const pRead = nPitch == nRow ? pTarget : oScratch.Get(nRow * oWanted.mnHeight);
+    oIO.ReadWindow(oRect.mnX + oWanted.mnX, oRect.mnY + oWanted.mnY, oWanted.mnWidth, oWanted.mnHeight, pRead);
+    if (pRead != pTarget)
+        raster::CopyRows(pRead, nRow, pTarget, nPitch, nRow, oWanted.mnHeight);
 }
 
 template class LinkedIOBase<krv::datasources::IRasterIO>;

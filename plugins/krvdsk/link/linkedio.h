@@ -3,6 +3,8 @@
 #include "datasources/interfaces/ioverviewio.h"
 #include "datasources/interfaces/irasterio.h"
 #include "plugins/krvdsk/link/link.h"
+#include "plugins/support/file/scratch.h"
+#include "plugins/support/image/iblocksource.h"
 #include "toolkit/exceptions/place.h"
 
 #include <exception>
@@ -55,6 +57,18 @@ private:
     std::unique_ptr<krv::datasources::IRasterIO> mpoInner;
     std::exception_ptr mpoTrouble; // why there is none
 };
+
+// A part of a block of a layout.
+struct BlockPart
+{
+    const support::ImageLayout& moLayout;
+    const support::BlockAddress& moBlock;
+    const support::PixelRect& moPart;
+};
+
+// Its pixels, in rows that lie nPitch bytes apart.
+void ReadBlockWindow(krv::datasources::IRasterIO& oIO, const BlockPart& oPart, unsigned char* pTarget,
+                     std::size_t nPitch, support::Scratch& oScratch);
 
 extern template class LinkedIOBase<krv::datasources::IRasterIO>;
 extern template class LinkedIOBase<krv::datasources::IOverviewIO>;

@@ -13,9 +13,8 @@ using krv::datasources::AuxiliaryData;
 using krv::datasources::IOverviewManager;
 
 LinkedLevels::LinkedLevels(std::shared_ptr<Link> poLink, std::unique_ptr<IOverviewManager> poOwn,
-                           std::unique_ptr<IOverviewManager> poTheirs, Sources oSources, unsigned int nChannels)
-    : mpoLink(std::move(poLink)), mpoOwn(std::move(poOwn)), mpoTheirs(std::move(poTheirs)),
-      moSources(std::move(oSources)), mnChannels(nChannels)
+                           std::unique_ptr<IOverviewManager> poTheirs, Owner oOwner)
+    : mpoLink(std::move(poLink)), mpoOwn(std::move(poOwn)), mpoTheirs(std::move(poTheirs)), moOwner(std::move(oOwner))
 {
 }
 
@@ -34,13 +33,6 @@ bool LinkedLevels::Has(const IOverviewManager* poManager, unsigned int nLevel)
     return std::find(oLevels.begin(), oLevels.end(), nLevel) != oLevels.end();
 }
 
-IOverviewManager& LinkedLevels::GetOwn(const char* pWhat, const Place& oPlace) const
-{
-    if (!mpoOwn)
-        Fail(std::string("all of it lies in ") + mpoLink->GetName() + ": " + pWhat, oPlace);
-    return *mpoOwn;
-}
-
 IOverviewManager& LinkedLevels::FindLevel(unsigned int nLevel, const Place& oPlace) const
 {
     if (Has(mpoOwn.get(), nLevel))
@@ -48,6 +40,17 @@ IOverviewManager& LinkedLevels::FindLevel(unsigned int nLevel, const Place& oPla
     if (!Has(mpoTheirs.get(), nLevel))
         Fail("there is no level " + std::to_string(nLevel), oPlace);
     return *mpoTheirs;
+}
+
+unsigned int LinkedLevels::FindSource(unsigned int nChannel, unsigned int nLevel) const
+{
+    const unsigned int nSource = moOwner.moFindSource(nChannel, nLevel);
+    if (nSource == 0 || !Has(mpoTheirs.get(), nLevel))
+        return 0;
+    const bool bOther = moOwner.mbForAll && Has(mpoOwn.get(), nLevel) &&
+                        (mpoOwn->GetLevelWidth(nLevel) != mpoTheirs->GetLevelWidth(nLevel) ||
+                         mpoOwn->GetLevelHeight(nLevel) != mpoTheirs->GetLevelHeight(nLevel));
+    return bOther ? 0 : nSource;
 }
 
 std::vector<unsigned int> LinkedLevels::GetLevels() const
@@ -67,51 +70,54 @@ krv::datasources::IRasterIO* LinkedLevels::GetOverviewIO(unsigned int nLevel,
     IOverviewManager& oLevel = FindLevel(nLevel, oPlace);
     std::vector<unsigned int> oSources;
     for (const unsigned int nChannel : oChannels)
-        oSources.push_back(moSources(nChannel));
-    const auto nLinked = oSources.size() - static_cast<std::size_t>(std::count(oSources.begin(), oSources.end(), 0U));
-    if (nLinked == 0 || nLinked < oSources.size())
-    {
-        const bool bThere = Has(mpoOwn.get(), nLevel) && (nLinked == 0 || Has(mpoTheirs.get(), nLevel));
-        if (!bThere)
-            Fail("level " + std::to_string(nLevel) + " is not there for all of these channels", oPlace);
+        oSources.push_back(FindSource(nChannel, nLevel));
+    const auto nOwn = static_cast<std::size_t>(std::count(oSources.begin(), oSources.end(), 0U));
+    if (&oLevel == mpoOwn.get() && (moOwner.mbForAll || nOwn == oSources.size()))
         return mpoOwn->GetOverviewIO(nLevel, oChannels);
-    }
-    if (!Has(mpoTheirs.get(), nLevel))
-        Fail("linked channels have no level " + std::to_string(nLevel), oPlace);
-    return new LinkedLevelIO(nLevel, mpoLink, {oLevel.GetLevelWidth(nLevel), oLevel.GetLevelHeight(nLevel)},
+    if (nOwn != 0)
+        Fail("level " + std::to_string(nLevel) + " is not there for all of these channels", oPlace);
+    return new LinkedLevelIO(nLevel, mpoLink, {mpoTheirs->GetLevelWidth(nLevel), mpoTheirs->GetLevelHeight(nLevel)},
                              [&] { return mpoTheirs->GetOverviewIO(nLevel, oSources); });
 }
 
 void LinkedLevels::CreateLevel(unsigned int nLevel)
 {
-    GetOwn("levels are made there", Place::Current()).CreateLevel(nLevel);
+    moOwner.moTakeOver(0, nLevel);
+    mpoOwn->CreateLevel(nLevel);
 }
 
 bool LinkedLevels::IsValid(unsigned int nChannel, unsigned int nLevel) const
 {
-    const unsigned int nSource = moSources(nChannel);
-    if (nSource == 0)
-        return mpoOwn && mpoOwn->IsValid(nChannel, nLevel);
-    return mpoTheirs && mpoTheirs->IsValid(nSource, nLevel);
+    const unsigned int nSource = FindSource(nChannel, nLevel);
+    return nSource != 0 ? mpoTheirs->IsValid(nSource, nLevel) : mpoOwn->IsValid(nChannel, nLevel);
 }
 
 void LinkedLevels::DeleteLevel(unsigned int nLevel)
 {
-    GetOwn("levels are deleted there", Place::Current()).DeleteLevel(nLevel);
+    const Place oPlace = Place::Current();
+    if (&FindLevel(nLevel, oPlace) != mpoOwn.get())
+        Fail("level " + std::to_string(nLevel) + " lies in " + mpoLink->GetName() + " and is not deleted from here",
+             oPlace);
+    mpoOwn->DeleteLevel(nLevel);
 }
 
 std::string LinkedLevels::GetResamplingName() const
 {
-    const std::string own = mpoOwn ? mpoOwn->GetResamplingName() : std::string();
+    const std::string own = mpoOwn->GetResamplingName();
     return own.empty() && mpoTheirs ? mpoTheirs->GetResamplingName() : own;
 }
 
 void LinkedLevels::SetValid(unsigned int nChannel, unsigned int nLevel, bool bValid)
 {
-    const Place oPlace = Place::Current();
-    if (moSources(nChannel) != 0)
-        Fail("the levels of channel " + std::to_string(nChannel) + " lie in " + mpoLink->GetName(), oPlace);
-    GetOwn("levels are changed there", oPlace).SetValid(nChannel, nLevel, bValid);
+    if (const unsigned int nSource = FindSource(nChannel, nLevel); nSource != 0)
+    {
+        if (mpoTheirs->IsValid(nSource, nLevel) == bValid)
+            return;
+        moOwner.moTakeOver(nChannel, nLevel);
+        if (!Has(mpoOwn.get(), nLevel))
+            mpoOwn->CreateLevel(nLevel);
+    }
+    mpoOwn->SetValid(nChannel, nLevel, bValid);
 }
 
 unsigned int LinkedLevels::GetLevelWidth(unsigned int nLevel) const
@@ -126,17 +132,18 @@ unsigned int LinkedLevels::GetLevelHeight(unsigned int nLevel) const
 
 AuxiliaryData LinkedLevels::GetAuxiliaryData(unsigned int nLevel)
 {
-    FindLevel(nLevel, Place::Current());
-    AuxiliaryData oData(mnChannels);
-    if (Has(mpoOwn.get(), nLevel))
+    const bool bOwn = &FindLevel(nLevel, Place::Current()) == mpoOwn.get();
+    AuxiliaryData oData(moOwner.mnChannels);
+    if (bOwn)
         oData = mpoOwn->GetAuxiliaryData(nLevel);
     if (!Has(mpoTheirs.get(), nLevel))
         return oData;
     const AuxiliaryData oTheirs = mpoTheirs->GetAuxiliaryData(nLevel);
-    if (!Has(mpoOwn.get(), nLevel))
+    if (!bOwn)
         oData.SetFileMetadata(oTheirs.GetFileMetadata());
-    for (unsigned int nChannel = 1; nChannel <= mnChannels && nChannel <= oData.GetChannelCount(); ++nChannel)
-        if (const unsigned int nSource = moSources(nChannel); nSource != 0 && nSource <= oTheirs.GetChannelCount())
+    for (unsigned int nChannel = 1; nChannel <= moOwner.mnChannels && nChannel <= oData.GetChannelCount(); ++nChannel)
+        if (const unsigned int nSource = FindSource(nChannel, nLevel);
+            nSource != 0 && nSource <= oTheirs.GetChannelCount())
         {
             oData.SetChanMetadata(oTheirs.GetChanMetadata(nSource), nChannel);
             oData.SetChannelDescription(oTheirs.GetChannelDescription(nSource), nChannel);
@@ -146,7 +153,7 @@ AuxiliaryData LinkedLevels::GetAuxiliaryData(unsigned int nLevel)
 
 void LinkedLevels::SetResamplingName(const std::string& oName)
 {
-    GetOwn("levels are made there", Place::Current()).SetResamplingName(oName);
+    mpoOwn->SetResamplingName(oName);
 }
 
 } // namespace krv::plugins::krvdsk

@@ -11,18 +11,27 @@
 namespace krv::plugins::krvdsk
 {
 
-// The levels of a file some of whose channels are linked: those of the other file and its own, as if they were one.
-// What is made here are levels of its own channels. Bitmaps count for channels where it is theirs.
+// The levels of a file some of whose channels are linked: those of the other file and its own, as if they were one. The
+// other file is not written: what is made or changed here is the file's own. Bitmaps count for channels where it is
+// theirs.
 class LinkedLevels : public krv::datasources::IOverviewManager
 {
 public:
-    // The numbers of channels in the other file; 0 for the file's own.
-    using Sources = std::function<unsigned int(unsigned int nChannel)>;
+    struct Owner
+    {
+        // The number that a channel has in the other file, when its level is seen from there; 0 when the file has that
+        // itself.
+        std::function<unsigned int(unsigned int nChannel, unsigned int nLevel)> moFindSource;
+        // Makes it the file's own, since it is to be changed. 0 for a channel: a level is to be made for all of them.
+        std::function<void(unsigned int nChannel, unsigned int nLevel)> moTakeOver;
+        // Whether the file's own levels have room for the linked channels too.
+        bool mbForAll;
+        unsigned int mnChannels;
+    };
 
-    // poOwn: of the file's own levels; poTheirs: of the other file's; either may be null. nChannels: of the file.
+    // poOwn: of the file's own levels; poTheirs: of the other file's, or null.
     LinkedLevels(std::shared_ptr<Link> poLink, std::unique_ptr<krv::datasources::IOverviewManager> poOwn,
-                 std::unique_ptr<krv::datasources::IOverviewManager> poTheirs, Sources oSources,
-                 unsigned int nChannels);
+                 std::unique_ptr<krv::datasources::IOverviewManager> poTheirs, Owner oOwner);
     ~LinkedLevels() override;
 
     std::vector<unsigned int> GetLevels() const override;
@@ -40,7 +49,8 @@ public:
 
 private:
     static bool Has(const krv::datasources::IOverviewManager* poManager, unsigned int nLevel);
-    krv::datasources::IOverviewManager& GetOwn(const char* pWhat, const Place& oPlace) const;
+    // As Owner says, where the other file has such a level and the file itself none of another size; else 0.
+    unsigned int FindSource(unsigned int nChannel, unsigned int nLevel) const;
     // Whose size of a level counts.
     krv::datasources::IOverviewManager& FindLevel(unsigned int nLevel, const Place& oPlace) const;
     [[noreturn]] void Fail(const std::string& what, const Place& oPlace) const;
@@ -48,8 +58,7 @@ private:
     std::shared_ptr<Link> mpoLink; // before the managers, which belong to its dataset
     std::unique_ptr<krv::datasources::IOverviewManager> mpoOwn;
     std::unique_ptr<krv::datasources::IOverviewManager> mpoTheirs;
-    Sources moSources;
-    unsigned int mnChannels;
+    Owner moOwner;
 };
 
 } // namespace krv::plugins::krvdsk

@@ -1,22 +1,17 @@
 #include "plugins/krvdsk/link/linkedsource.h"
 
-#include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "plugins/krvdsk/link/linkedio.h"
-#include "toolkit/exceptions/exceptions.h"
-#include "toolkit/raster/interleave.h"
 
 namespace krv::plugins::krvdsk
 {
 
-using krv::datasources::IOverviewManager;
 using krv::datasources::IRasterDataset;
 using krv::datasources::IRasterIO;
 
 LinkedSource::LinkedSource(std::shared_ptr<Link> poLink, const std::vector<Link::Channel>& oChannels,
-                           unsigned int nLevel, std::shared_ptr<support::IBlockSource> poOwn)
-    : mpoLink(std::move(poLink)), mnLevel(nLevel), mpoOwn(std::move(poOwn)), moPlanes(MakePlanes(oChannels)),
-      moLayout(MakeLayout())
+                           std::shared_ptr<support::IBlockSource> poOwn)
+    : mpoLink(std::move(poLink)), mpoOwn(std::move(poOwn)), moPlanes(MakePlanes(oChannels)), moLayout(MakeLayout())
 {
 }
 
@@ -55,15 +50,9 @@ IRasterIO& LinkedSource::GetIO(LinkedPlane& oPlane)
 {
     if (oPlane.mpoIO)
         return *oPlane.mpoIO;
-    const auto Make = [&]() -> IRasterIO*
+    const auto Make = [&]
     {
-        auto& oRaster = dynamic_cast<IRasterDataset&>(mpoLink->Get());
-        if (mnLevel == 1)
-            return oRaster.GetRasterIO(oPlane.moNumbers);
-        const std::unique_ptr<IOverviewManager> poLevels(oRaster.GetOverviewManager());
-        if (!poLevels)
-            throw IOException(GetName(), GetName() + ": its linked channels have no level " + std::to_string(mnLevel));
-        return poLevels->GetOverviewIO(mnLevel, oPlane.moNumbers);
+        return dynamic_cast<IRasterDataset&>(mpoLink->Get()).GetRasterIO(oPlane.moNumbers);
     };
     oPlane.mpoIO = std::make_unique<LinkedIO>(mpoLink, LinkedIO::Size{moLayout.GetWidth(), moLayout.GetHeight()}, Make);
     return *oPlane.mpoIO;
@@ -76,13 +65,7 @@ void LinkedSource::ReadBlock(const support::BlockAddress& oBlock, const support:
         return mpoOwn->ReadBlock(
             {oBlock.mnPlane - static_cast<unsigned int>(moPlanes.size()), oBlock.mnColumn, oBlock.mnRow}, oPart,
             pTarget, nPitch);
-    const support::PixelRect oRect = moLayout.GetBlockRect(oBlock.mnColumn, oBlock.mnRow);
-    const std::size_t nRow = oPart.mnWidth * moLayout.GetPixelBytes(oBlock.mnPlane);
-    unsigned char* const pRead = nPitch == nRow ? pTarget : moScratch.Get(nRow * oPart.mnHeight);
-    GetIO(moPlanes[oBlock.mnPlane])
-        .ReadWindow(oRect.mnX + oPart.mnX, oRect.mnY + oPart.mnY, oPart.mnWidth, oPart.mnHeight, pRead);
-    if (pRead != pTarget)
-        raster::CopyRows(pRead, nRow, pTarget, nPitch, nRow, oPart.mnHeight);
+    ReadBlockWindow(GetIO(moPlanes[oBlock.mnPlane]), {moLayout, oBlock, oPart}, pTarget, nPitch, moScratch);
 }
 
 void LinkedSource::WriteBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart,

@@ -10,13 +10,13 @@
 namespace krv::plugins::krvdsk
 {
 
-// The pixels of an image, or of a level, whose first channels are linked: theirs from the other file, all others from
-// the file's own source. Linked blocks cannot be written.
+// The pixels of an image whose first channels are linked: theirs from the other file, all others from the file's own
+// source. Linked blocks cannot be written.
 class LinkedSource : public support::IBlockSource
 {
 public:
-    // nLevel: 1 for the image. oChannels: those that are linked, in their order; neighbours of one type make a plane.
-    LinkedSource(std::shared_ptr<Link> poLink, const std::vector<Link::Channel>& oChannels, unsigned int nLevel,
+    // oChannels: those that are linked, in their order; neighbours of one type make a plane.
+    LinkedSource(std::shared_ptr<Link> poLink, const std::vector<Link::Channel>& oChannels,
                  std::shared_ptr<support::IBlockSource> poOwn);
     ~LinkedSource() override;
 
@@ -44,7 +44,6 @@ private:
     krv::datasources::IRasterIO& GetIO(LinkedPlane& oPlane);
 
     std::shared_ptr<Link> mpoLink; // before the I/O objects of the planes
-    unsigned int mnLevel;
     std::shared_ptr<support::IBlockSource> mpoOwn;
     std::vector<LinkedPlane> moPlanes;
     support::ImageLayout moLayout;

@@ -12,9 +12,10 @@
 namespace krv::plugins::krvdsk
 {
 
-std::size_t TileCodec::GetLargest(std::size_t nWidth, std::size_t nRows) const
+std::size_t TileCodec::GetLargest(unsigned int nWidth, unsigned int nRows) const
 {
-    const std::size_t nPlain = GetStoredRowBytes(nWidth) * nRows;
+    const ImageSize oStored = GetStoredSize(nWidth, nRows);
+    const std::size_t nPlain = GetStoredRowBytes(oStored.mnWidth) * oStored.mnHeight;
     return moPlane.meCoding == Coding::eNone ? nPlain : nPlain + nPlain / 2 + 65536;
 }
 
@@ -29,8 +30,23 @@ void TileCodec::Pick(const unsigned char* pStored, std::size_t nStoredPitch, std
                            oPositions.size(), {nWidth, nRows, moPlane.moType.GetValueBits() / 8});
 }
 
-const char* TileCodec::Decode(const unsigned char* pStored, std::size_t nStored, std::size_t nWidth, std::size_t nRows,
-                              unsigned char* pTarget, std::size_t nPitch)
+const char* TileCodec::Decode(const unsigned char* pStored, std::size_t nStored, unsigned int nWidth,
+                              unsigned int nRows, unsigned char* pTarget, std::size_t nPitch)
+{
+    const ImageSize oStored = GetStoredSize(nWidth, nRows);
+    if (oStored.mnWidth == nWidth && oStored.mnHeight == nRows)
+        return DecodeStored(pStored, nStored, nWidth, nRows, pTarget, nPitch);
+    const std::size_t nPixel = moPlane.moType.GetValueBits() / 8 * moPlane.GetChannels();
+    unsigned char* const pWhole = moWhole.Get(nPixel * oStored.mnWidth * oStored.mnHeight);
+    const char* const pCause =
+        DecodeStored(pStored, nStored, oStored.mnWidth, oStored.mnHeight, pWhole, nPixel * oStored.mnWidth);
+    if (pCause == nullptr)
+        raster::CopyRows(pWhole, nPixel * oStored.mnWidth, pTarget, nPitch, nPixel * nWidth, nRows);
+    return pCause;
+}
+
+const char* TileCodec::DecodeStored(const unsigned char* pStored, std::size_t nStored, std::size_t nWidth,
+                                    std::size_t nRows, unsigned char* pTarget, std::size_t nPitch)
 {
     const std::size_t nRowBytes = GetStoredRowBytes(nWidth), nBytes = nRowBytes * nRows;
     const bool bPredicted = moPlane.mnPredictor != 1;
@@ -113,8 +129,23 @@ const unsigned char* TileCodec::Spread(const unsigned char* pSource, std::size_t
     return pRows;
 }
 
-std::span<const unsigned char> TileCodec::Encode(const unsigned char* pSource, std::size_t nPitch, std::size_t nWidth,
-                                                 std::size_t nRows)
+// What lies beyond the image is 0.
+std::span<const unsigned char> TileCodec::Encode(const unsigned char* pSource, std::size_t nPitch, unsigned int nWidth,
+                                                 unsigned int nRows)
+{
+    const ImageSize oStored = GetStoredSize(nWidth, nRows);
+    if (oStored.mnWidth == nWidth && oStored.mnHeight == nRows)
+        return EncodeStored(pSource, nPitch, nWidth, nRows);
+    const std::size_t nPixel = moPlane.moType.GetValueBits() / 8 * moPlane.GetChannels();
+    const std::size_t nWholePitch = nPixel * oStored.mnWidth;
+    unsigned char* const pWhole = moWhole.Get(nWholePitch * oStored.mnHeight);
+    std::memset(pWhole, 0, nWholePitch * oStored.mnHeight);
+    raster::CopyRows(pSource, nPitch, pWhole, nWholePitch, nPixel * nWidth, nRows);
+    return EncodeStored(pWhole, nWholePitch, oStored.mnWidth, oStored.mnHeight);
+}
+
+std::span<const unsigned char> TileCodec::EncodeStored(const unsigned char* pSource, std::size_t nPitch,
+                                                       std::size_t nWidth, std::size_t nRows)
 {
     const std::size_t nRowBytes = GetStoredRowBytes(nWidth), nBytes = nRowBytes * nRows;
     const unsigned char* pRows = pSource;

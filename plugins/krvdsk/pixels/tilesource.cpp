@@ -65,10 +65,10 @@ std::unique_ptr<TileSource::Work> TileSource::MakeWork(std::size_t nPlane)
         StoreTile(*moWorks[nPlane], {oBlock.mnNumber, oBlock.moRect}, pPixels, oBlock.moRect.mnWidth * nPixelBytes);
     };
     return std::unique_ptr<Work>(
-        new Work{poPlane, poPlane->moTables.at(moOrigin.mnLevel), TileCodec(*poPlane),
+        new Work{poPlane, poPlane->moTables.at(moOrigin.mnLevel),
+                 TileCodec(*poPlane, {moLayout.GetBlockWidth(), moLayout.GetBlockHeight()}),
                  support::HeldBlocks(ChooseBound(moLayout, nPixelBytes), nPixelBytes, StoreBlock,
-                                     poPlane->moType.GetBits() < 8 ? support::HeldBlocks::Samples::eBits
-                                                                   : support::HeldBlocks::Samples::eValues)});
+                                     poPlane->moType.GetBits() < 8 ? &support::HeldBlocks::SettleBits : nullptr)});
 }
 
 TileSource::Spot TileSource::GetSpot(const support::BlockAddress& oBlock) const
@@ -96,6 +96,15 @@ void TileSource::Verify(Work& oWork, const Spot& oSpot, const TileTable::Tile& o
     if (nChecksum != oTile.moEntry.mnChecksum)
         Fail(oWork, oSpot, "is damaged: its checksum is wrong");
     oWork.mpoTable->SetVerified(oTile);
+}
+
+// In one state of a file the place of a table tells its tiles from all others; those of empty tables are all alike.
+support::BlockOrigin TileSource::GetOrigin() const
+{
+    std::string image = "KRVDSK";
+    for (const std::unique_ptr<Work>& poWork : moWorks)
+        image += " " + std::to_string(poWork->mpoTable->GetTop().mnOffset);
+    return {moOrigin.mpoStore->ShareFile(), std::move(image)};
 }
 
 void TileSource::ReadBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
@@ -138,7 +147,8 @@ void TileSource::ReadStored(Work& oWork, const Spot& oSpot, const support::Pixel
 void TileSource::ReadPlainRows(const Work& oWork, const Spot& oSpot, const TileTable::Tile& oTile,
                                const support::PixelRect& oPart, unsigned char* pTarget, std::size_t nPitch)
 {
-    const std::size_t nStoredPitch = oWork.moCodec.GetStoredRowBytes(oSpot.moRect.mnWidth);
+    const ImageSize oStored = oWork.moCodec.GetStoredSize(oSpot.moRect.mnWidth, oSpot.moRect.mnHeight);
+    const std::size_t nStoredPitch = oWork.moCodec.GetStoredRowBytes(oStored.mnWidth);
     moOrigin.mpoStore->GetFile().ReadRows(
         oTile.moEntry.mnOffset + oPart.mnY * nStoredPitch + oWork.moCodec.GetStoredRowBytes(oPart.mnX), nStoredPitch,
         oWork.moCodec.GetStoredRowBytes(oPart.mnWidth), oPart.mnHeight, pTarget, nPitch, moRows);
@@ -147,8 +157,9 @@ void TileSource::ReadPlainRows(const Work& oWork, const Spot& oSpot, const TileT
 void TileSource::ReadPlain(Work& oWork, const Spot& oSpot, const TileTable::Tile& oTile,
                            const support::PixelRect& oPart, unsigned char* pTarget, std::size_t nPitch)
 {
-    const support::PixelRect oWhole{0, 0, oSpot.moRect.mnWidth, oSpot.moRect.mnHeight};
     const TileCodec& oCodec = oWork.moCodec;
+    const ImageSize oStored = oCodec.GetStoredSize(oSpot.moRect.mnWidth, oSpot.moRect.mnHeight);
+    const support::PixelRect oWhole{0, 0, oStored.mnWidth, oStored.mnHeight};
     const std::size_t nWholePitch = oCodec.GetStoredRowBytes(oWhole.mnWidth);
     if (oCodec.IsWhole() && (oTile.mbVerified || oPart == oWhole))
     {

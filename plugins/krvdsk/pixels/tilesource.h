@@ -38,6 +38,7 @@ public:
     const support::ImageLayout& GetLayout() const override { return moLayout; }
     std::string GetName() const override { return moOrigin.mpoStore->GetName(); }
     bool ReadsParts() const override { return mbPlain; }
+    support::BlockOrigin GetOrigin() const override;
     void ReadBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, unsigned char* pTarget,
                    std::size_t nPitch) override;
     void WriteBlock(const support::BlockAddress& oBlock, const support::PixelRect& oPart, const unsigned char* pSource,

@@ -153,10 +153,20 @@ unsigned int Catalogue::CountChannels() const
     return nChannels;
 }
 
+std::vector<std::shared_ptr<Plane>> Catalogue::GetLevelPlanes() const
+{
+    std::vector<std::shared_ptr<Plane>> oPlanes = moLinkedPlanes;
+    oPlanes.insert(oPlanes.end(), moPlanes.begin(), moPlanes.end());
+    return oPlanes;
+}
+
 std::string Catalogue::FindObstacle(const Plane& oPlane) const
 {
-    const std::uint64_t nRowBits = std::min(mnBlockWidth, moSize.mnWidth) * oPlane.GetPixelBits();
-    const std::uint64_t nBytes = (nRowBits + 7) / 8 * std::min(mnBlockHeight, moSize.mnHeight);
+    const bool bWhole = oPlane.meStorage == Storage::eWholeTiles;
+    const std::uint64_t nRowBits =
+        (bWhole ? mnBlockWidth : std::min(mnBlockWidth, moSize.mnWidth)) * oPlane.GetPixelBits();
+    const std::uint64_t nBytes =
+        (nRowBits + 7) / 8 * (bWhole ? mnBlockHeight : std::min(mnBlockHeight, moSize.mnHeight));
     if (nBytes > LARGEST_TILE)
         return "a tile would be of " + std::to_string(nBytes) + " bytes, more than " + std::to_string(LARGEST_TILE);
     if (CountTiles(moSize) > MOST_TILES)
@@ -192,6 +202,14 @@ std::shared_ptr<Plane> Catalogue::MakePlane(const krv::gobs::DataType& oType, un
     return poPlane;
 }
 
+std::shared_ptr<Plane> Catalogue::MakeLinkedPlane(const krv::gobs::DataType& oType, const std::string& name,
+                                                  const Place& oPlace) const
+{
+    std::shared_ptr<Plane> poPlane = MakePlane(oType, 1, name, oPlace);
+    poPlane->moTables.erase(1);
+    return poPlane;
+}
+
 std::shared_ptr<Plane> Catalogue::MakeBitmapPlane() const
 {
     auto poPlane = std::make_shared<Plane>();
@@ -219,8 +237,8 @@ void Catalogue::Describe() const
         for (const auto& [nLevel, poTable] : oPlane.moTables)
             poTable->SetDescription(nLevel == 1 ? what : what + ", level " + std::to_string(nLevel));
     };
-    unsigned int nFirst = static_cast<unsigned int>(moLinked.size()) + 1;
-    for (const std::shared_ptr<Plane>& poPlane : moPlanes)
+    unsigned int nFirst = 1;
+    for (const std::shared_ptr<Plane>& poPlane : GetLevelPlanes())
     {
         Name(*poPlane, DescribePlane(nFirst, poPlane->GetChannels()));
         nFirst += poPlane->GetChannels();
@@ -266,6 +284,8 @@ std::vector<unsigned char> Catalogue::Write() const
                         oItem.AddNumber(oChannel.mnNumber, 4);
                         oItem.AddNumber(GetTypeCode(oChannel.moType), 1);
                     }
+                    for (const std::shared_ptr<Plane>& poPlane : moLinkedPlanes)
+                        AddPlane(oItem, *poPlane);
                 });
     for (const std::shared_ptr<Plane>& poPlane : moPlanes)
         AddItem(PLANE, [&poPlane](BytesWriter& oItem) { AddPlane(oItem, *poPlane); });
@@ -314,14 +334,15 @@ void Catalogue::ReadImage(BytesReader oItem)
     meCoding = static_cast<Coding>(nCoding);
 }
 
-std::shared_ptr<Plane> Catalogue::ReadPlane(BytesReader& oItem, bool bBitmap) const
+std::shared_ptr<Plane> Catalogue::ReadPlane(BytesReader& oItem, Use eUse) const
 {
+    const bool bBitmap = eUse == Use::eBitmap;
     auto poPlane = std::make_shared<Plane>();
     const std::uint64_t nStorage = oItem.ReadNumber(1), nType = oItem.ReadNumber(1), nCoding = oItem.ReadNumber(1);
     poPlane->mnPredictor = static_cast<std::uint8_t>(oItem.ReadNumber(1));
     poPlane->mnCodingLevel = static_cast<std::uint8_t>(oItem.ReadNumber(1));
-    if (nStorage > static_cast<std::uint64_t>(Storage::eTiles) || nType > krv::gobs::eDT_BIT ||
-        (nType == krv::gobs::eDT_BIT) != bBitmap || nCoding >= std::size(CODING_NAMES))
+    if (nStorage > static_cast<std::uint64_t>(bBitmap ? Storage::eTiles : Storage::eWholeTiles) ||
+        nType > krv::gobs::eDT_BIT || (nType == krv::gobs::eDT_BIT) != bBitmap || nCoding >= std::size(CODING_NAMES))
         oItem.Fail("channels of storage " + std::to_string(nStorage) + ", type " + std::to_string(nType) +
                    " and coding " + std::to_string(nCoding) + " cannot be");
     poPlane->meStorage = static_cast<Storage>(nStorage);
@@ -332,13 +353,14 @@ std::shared_ptr<Plane> Catalogue::ReadPlane(BytesReader& oItem, bool bBitmap) co
                    poPlane->moType.Describe());
     for (const unsigned char nThere : oItem.ReadBytes(oItem.ReadCount()))
         poPlane->moThere.push_back(nThere != 0);
-    if (poPlane->GetChannels() == 0 || (bBitmap && poPlane->moThere.size() != 1))
+    if (poPlane->GetChannels() == 0 || (eUse != Use::eChannels && poPlane->moThere.size() != 1))
         oItem.Fail("a plane has no channels, or too many");
     const std::string obstacle = FindObstacle(*poPlane);
     if (!obstacle.empty())
         oItem.Fail(obstacle);
     std::map<unsigned int, ImageSize> oImages = bBitmap ? moBitmapLevels : moLevels;
-    oImages[1] = moSize;
+    if (eUse != Use::eLinked)
+        oImages[1] = moSize;
     if (oItem.ReadCount() != oImages.size())
         oItem.Fail("the levels of a plane are not those of the file");
     for (const auto& [nLevel, oSize] : oImages)
@@ -362,6 +384,12 @@ void Catalogue::ReadLink(BytesReader oItem)
                        " cannot be linked");
         moLinked.push_back({nNumber, static_cast<krv::gobs::NativeDataTypeCode>(nType)});
     }
+    for (const Link::Channel& oChannel : moLinked)
+    {
+        moLinkedPlanes.push_back(ReadPlane(oItem, Use::eLinked));
+        if (moLinkedPlanes.back()->moType != oChannel.moType)
+            oItem.Fail("the levels of a linked channel are of another type than it is");
+    }
     if (moLinkPath.empty() || moLinkPath.find('\0') != moLinkPath.npos)
         oItem.Fail("a link leads nowhere");
 }
@@ -375,7 +403,7 @@ void Catalogue::ReadSegment(BytesReader oItem)
     oSegment.moDescription = oItem.ReadText();
     oSegment.moMetadata = ReadMap(oItem);
     if (oSegment.moKind == Segment::BITMAP)
-        oSegment.mpoPlane = ReadPlane(oItem, true);
+        oSegment.mpoPlane = ReadPlane(oItem, Use::eBitmap);
     else
         oSegment.moBytes.moEntry = oItem.ReadEntry();
     if (nNumber == 0 || nNumber >= mnNextSegment || oSegment.moKind.empty() ||
@@ -403,7 +431,7 @@ Catalogue Catalogue::Read(const StoreFile& oStore, const std::vector<unsigned ch
         }
         else if (name == PLANE)
         {
-            oCatalogue.moPlanes.push_back(oCatalogue.ReadPlane(oItem, false));
+            oCatalogue.moPlanes.push_back(oCatalogue.ReadPlane(oItem, Use::eChannels));
             nChannels += oCatalogue.moPlanes.back()->GetChannels();
         }
         else if (name == LINK && oCatalogue.moLinkPath.empty())

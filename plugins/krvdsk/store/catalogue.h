@@ -33,7 +33,8 @@ const char* GetCodingName(Coding eCoding);
 // Where the pixels of a plane are. The values are those of the file.
 enum class Storage : std::uint8_t
 {
-    eTiles = 0
+    eTiles = 0,     // tiles hold what of them lies in the image
+    eWholeTiles = 1 // all tiles are of one size, as those of TIFF are
 };
 
 // Channels of one type that are stored together, pixel interleaved, with their levels; or a bitmap.
@@ -120,6 +121,8 @@ struct Catalogue
     // Channels count through those that lie in another file, and then through the planes.
     std::string moLinkPath; // of that file, from the folder of this one; empty: there is none
     std::vector<Link::Channel> moLinked;
+    // Of each of them a plane for levels of its own, without the image.
+    std::vector<std::shared_ptr<Plane>> moLinkedPlanes;
     std::vector<std::shared_ptr<Plane>> moPlanes;
     std::map<unsigned int, ImageSize> moLevels; // from 2 on
     std::map<unsigned int, Segment> moSegments;
@@ -135,6 +138,8 @@ struct Catalogue
     std::vector<unsigned char> Write() const;
 
     unsigned int CountChannels() const;
+    // The planes of all channels, in which levels lie: those of linked ones first.
+    std::vector<std::shared_ptr<Plane>> GetLevelPlanes() const;
     // Of a level as new ones are made; of the image, 1.
     ImageSize GetUsualSize(unsigned int nLevel) const;
     std::uint64_t CountTiles(const ImageSize& oSize) const;
@@ -144,18 +149,26 @@ struct Catalogue
     // too large or too many.
     std::shared_ptr<Plane> MakePlane(const krv::gobs::DataType& oType, unsigned int nChannels, const std::string& name,
                                      const Place& oPlace) const;
+    std::shared_ptr<Plane> MakeLinkedPlane(const krv::gobs::DataType& oType, const std::string& name,
+                                           const Place& oPlace) const;
     std::shared_ptr<Plane> MakeBitmapPlane() const;
+    // Why tiles of such a plane cannot be; empty when they can.
+    std::string FindObstacle(const Plane& oPlane) const;
     // Gives the tables their names for messages, which count channels.
     void Describe() const;
     static std::string DescribePlane(unsigned int nFirst, unsigned int nChannels);
 
 private:
     void ReadImage(BytesReader oItem);
-    std::shared_ptr<Plane> ReadPlane(BytesReader& oItem, bool bBitmap) const;
+    enum class Use
+    {
+        eChannels,
+        eLinked,
+        eBitmap
+    };
+    std::shared_ptr<Plane> ReadPlane(BytesReader& oItem, Use eUse) const;
     void ReadSegment(BytesReader oItem);
     void ReadLink(BytesReader oItem);
-    // Why tiles of such a plane cannot be; empty when they can.
-    std::string FindObstacle(const Plane& oPlane) const;
 };
 
 // Metadata, descriptions and histories of channels, as they are stored.

@@ -61,6 +61,7 @@ public:
 
     const std::string& GetName() const { return mpoFile->GetName(); }
     support::File& GetFile() const { return *mpoFile; }
+    const std::shared_ptr<support::File>& ShareFile() const { return mpoFile; }
     const Root& GetRoot() const { return moRoot; }
     void SetRoot(const Root& oRoot) { moRoot = oRoot; }
     // The end of all pieces; grows while the file is written.

@@ -64,7 +64,7 @@ void StoreWriter::UseSpace(std::uint64_t nEnd)
 
 void StoreWriter::ForEachTable(const std::function<void(TileTable& oTable)>& oAction) const
 {
-    for (const std::shared_ptr<Plane>& poPlane : moCatalogue.moPlanes)
+    for (const std::shared_ptr<Plane>& poPlane : moCatalogue.GetLevelPlanes())
         for (const auto& [nLevel, poTable] : poPlane->moTables)
             oAction(*poTable);
     for (const auto& [nNumber, oSegment] : moCatalogue.moSegments)

@@ -49,6 +49,9 @@ public:
     // Writes the pages that changed.
     void WritePages(StoreWriter& oWriter);
     bool IsChanged() const { return moTop.mbChanged; }
+    void Touch() { moTop.mbChanged = true; }
+    // Whether nothing is stored, or on its way.
+    bool IsEmpty() const { return !GetTop().IsStored() && !moTop.mbChanged; }
 
     // Every stored page and tile, pages before what they name. nTile: UINT64_MAX for a page. Pages that are not in
     // memory are read, and dropped again unless bKeep is set.

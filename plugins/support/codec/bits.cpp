@@ -451,6 +451,34 @@ void FloatToFloat24(const unsigned char* source, unsigned char* destination, std
     }
 }
 
+namespace
+{
+
+template <typename T>
+void FitValues(unsigned char* values, std::size_t nCount, std::int64_t nLowest, std::int64_t nHighest)
+{
+    T* const pValues = reinterpret_cast<T*>(values);
+    for (std::size_t n = 0; n < nCount; ++n)
+        pValues[n] = static_cast<T>(std::clamp<std::int64_t>(pValues[n], nLowest, nHighest));
+}
+
+} // namespace
+
+void FitBits(unsigned char* values, std::size_t nCount, std::size_t nValueBytes, unsigned int nBits, bool bSigned)
+{
+    const std::int64_t nHighest = (std::int64_t{1} << (nBits - (bSigned ? 1 : 0))) - 1;
+    const std::int64_t nLowest = bSigned ? -nHighest - 1 : 0;
+    if (nValueBytes == 1)
+        bSigned ? FitValues<std::int8_t>(values, nCount, nLowest, nHighest)
+                : FitValues<std::uint8_t>(values, nCount, nLowest, nHighest);
+    else if (nValueBytes == 2)
+        bSigned ? FitValues<std::int16_t>(values, nCount, nLowest, nHighest)
+                : FitValues<std::uint16_t>(values, nCount, nLowest, nHighest);
+    else
+        bSigned ? FitValues<std::int32_t>(values, nCount, nLowest, nHighest)
+                : FitValues<std::uint32_t>(values, nCount, nLowest, nHighest);
+}
+
 void ReverseBits(const unsigned char* source, unsigned char* destination, std::size_t nBytes)
 {
     std::size_t i = ReverseVectors(source, destination, nBytes);

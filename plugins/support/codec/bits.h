@@ -38,6 +38,10 @@ void Float24ToFloat(const unsigned char* source, unsigned char* destination, std
 void FloatToHalf(const unsigned char* source, unsigned char* destination, std::size_t nCount);
 void FloatToFloat24(const unsigned char* source, unsigned char* destination, std::size_t nCount);
 
+// Brings nCount integers of nValueBytes (1, 2 or 4) bytes, in this machine's order, into the range of nBits bits: what
+// does not fit becomes the nearest value that does.
+void FitBits(unsigned char* values, std::size_t nCount, std::size_t nValueBytes, unsigned int nBits, bool bSigned);
+
 // Turns round the bits of every byte. In place is allowed.
 void ReverseBits(const unsigned char* source, unsigned char* destination, std::size_t nBytes);
 

@@ -1,13 +1,13 @@
 #include "plugins/support/codec/checksum.h"
 
-#include <libdeflate.h>
+#include <isa-l/crc.h>
 
 namespace krv::plugins::codec
 {
 
 std::uint32_t Checksum(std::uint32_t nBefore, const void* pBytes, std::size_t nBytes)
 {
-    return libdeflate_crc32(nBefore, pBytes, nBytes);
+    return crc32_gzip_refl(nBefore, static_cast<const unsigned char*>(pBytes), nBytes);
 }
 
 std::uint32_t Checksum(const unsigned char* pRows, std::size_t nPitch, std::size_t nRowBytes, std::size_t nRows)

@@ -7,6 +7,7 @@
 #include <cerrno>
 #include <chrono>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 
 #include <fcntl.h>
@@ -80,10 +81,22 @@ int OpenFlags(File::Mode eMode)
         return O_RDONLY | O_CLOEXEC | O_NONBLOCK;
     case File::Mode::eUpdate:
         return O_RDWR | O_CLOEXEC;
+    case File::Mode::eScratch:
+        return O_RDWR | O_TMPFILE | O_CLOEXEC;
     case File::Mode::eCreate:
         break;
     }
     return O_RDWR | O_CREAT | O_TRUNC | O_CLOEXEC;
+}
+
+// Where the file system has no files without a name, one loses it at once.
+int OpenUnnamed(const std::string& folder)
+{
+    std::string name = folder + "/.krvXXXXXX";
+    const int nDescriptor = ::mkostemp(name.data(), O_CLOEXEC);
+    if (nDescriptor >= 0)
+        ::unlink(name.c_str());
+    return nDescriptor;
 }
 
 [[noreturn]] void ThrowOpenError(const std::string& fileName, int nError, const Place& oPlace)
@@ -150,7 +163,9 @@ private:
 
 File::File(const std::string& fileName, Mode eMode, const Place& oPlace) : moName(fileName), moPath(fileName)
 {
-    mnDescriptor = ::open(fileName.c_str(), OpenFlags(eMode), 0666);
+    mnDescriptor = ::open(fileName.c_str(), OpenFlags(eMode), eMode == Mode::eScratch ? 0600 : 0666);
+    if (mnDescriptor < 0 && eMode == Mode::eScratch && (errno == EOPNOTSUPP || errno == EISDIR))
+        mnDescriptor = OpenUnnamed(fileName);
     if (mnDescriptor < 0)
         ThrowOpenError(fileName, errno, oPlace);
     struct stat oStatus = {};

@@ -26,7 +26,8 @@ public:
     {
         eRead,   // an existing file
         eUpdate, // an existing file, to be written too
-        eCreate  // a new or emptied file
+        eCreate, // a new or emptied file
+        eScratch // a new file without a name, in the folder of the given name: it goes with the object, or the program
     };
 
     // Throws FileNotFoundException when there is no such file, IOException when it cannot be opened, is no plain file

@@ -94,7 +94,8 @@ private:
     Scratch moPlanes;
 };
 
-// Windows over it, without a cache: the system has one of the file.
+// Windows over it, without a cache: the system has one of the file, which all readers share, and rows cost as much to
+// copy from there as from a store of ours, which would hold the same bytes once more.
 class PlainIO : public krv::datasources::WindowedIO<krv::datasources::IRasterIO>
 {
 public:

@@ -1,5 +1,6 @@
 #include "plugins/support/sidecar/auxxml.h"
 
+#include "datasources/metadata/pixelstatistics.h"
 #include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/xml/xmlwriter.h"
@@ -25,6 +26,7 @@ namespace
 
 constexpr char ROOT[] = "PAMDataset";
 constexpr char BAND[] = "PAMRasterBand";
+constexpr char HISTOGRAMS[] = "Histograms";
 constexpr char METADATA[] = "Metadata";
 constexpr char STAMP[] = "WrittenBeside";
 constexpr char DESCRIPTION[] = "Description";
@@ -192,6 +194,20 @@ void AuxXml::ReadBand(const Element& oBand)
     }
     if (!oRest.children.empty())
         moRoot.children.push_back(std::move(oRest));
+}
+
+bool AuxXml::DropStatistics()
+{
+    bool bAny = krv::datasources::DropStatistics(moTags);
+    const auto IsHistograms = [](const Element& oOne)
+    {
+        return oOne.name == HISTOGRAMS;
+    };
+    for (Element& oBand : moRoot.children)
+        if (oBand.name == BAND && std::erase_if(oBand.children, IsHistograms) > 0)
+            bAny = true;
+    std::erase_if(moRoot.children, [](const Element& oOne) { return oOne.name == BAND && oOne.children.empty(); });
+    return bAny;
 }
 
 bool AuxXml::IsEmpty() const

@@ -42,6 +42,8 @@ public:
     void SetTags(const krv::datasources::AuxiliaryData& oTags) { moTags = oTags; }
     void SetStamp(const Stamp& oStamp) { moStamp = oStamp; }
 
+    // Statistics and histograms, which do not hold when pixels change. True when there were any.
+    bool DropStatistics();
     // Whether it says anything.
     bool IsEmpty() const;
     // The document with what was set, and with all that this library does not know as it was.

@@ -4,8 +4,11 @@
 #include "toolkit/core/lettercase.h"
 #include "toolkit/exceptions/exceptions.h"
 
+#include <algorithm>
 #include <filesystem>
-#include <system_error>
+#include <utility>
+
+#include <sys/stat.h>
 
 namespace krv::plugins::support
 {
@@ -13,19 +16,36 @@ namespace krv::plugins::support
 namespace
 {
 
-std::string FindBeside(const std::filesystem::path& oFile, const std::string& base, const std::string& ending)
+// The names that a file beside another one may have, each once.
+std::vector<std::string> ListNames(const std::string& base, const std::string& ending)
 {
-    const std::string names[] = {base + ending, base + ToLower(ending), base + ToUpper(ending), ToLower(base + ending),
-                                 ToUpper(base + ending)};
-    std::string tried;
-    for (const std::string& name : names)
-    {
-        const std::filesystem::path oSidecar = oFile.parent_path() / name;
-        std::error_code oNone;
-        if (name != tried && std::filesystem::is_regular_file(oSidecar, oNone))
-            return oSidecar.string();
-        tried = name;
-    }
+    std::vector<std::string> oNames;
+    for (std::string name : {base + ending, base + ToLower(ending), base + ToUpper(ending), ToLower(base + ending),
+                             ToUpper(base + ending)})
+        if (std::find(oNames.begin(), oNames.end(), name) == oNames.end())
+            oNames.push_back(std::move(name));
+    return oNames;
+}
+
+bool IsFile(const std::string& name)
+{
+    struct stat oStatus = {};
+    return ::stat(name.c_str(), &oStatus) == 0 && S_ISREG(oStatus.st_mode);
+}
+
+// The folder of a file with its slash, and the file's name in it.
+std::pair<std::string, std::string> SplitName(const std::string& fileName)
+{
+    const std::size_t nSlash = fileName.rfind('/');
+    const std::size_t nName = nSlash == std::string::npos ? 0 : nSlash + 1;
+    return {fileName.substr(0, nName), fileName.substr(nName)};
+}
+
+std::string FindBeside(const std::string& folder, const std::string& base, const std::string& ending)
+{
+    for (const std::string& name : ListNames(base, ending))
+        if (IsFile(folder + name))
+            return folder + name;
     return {};
 }
 
@@ -33,14 +53,28 @@ std::string FindBeside(const std::filesystem::path& oFile, const std::string& ba
 
 std::string FindSidecar(const std::string& fileName, const std::string& ending)
 {
-    const std::filesystem::path oFile(fileName);
-    return FindBeside(oFile, oFile.stem().string(), ending);
+    const auto [folder, name] = SplitName(fileName);
+    return FindBeside(folder, std::filesystem::path(name).stem().string(), ending);
 }
 
 std::string FindAppended(const std::string& fileName, const std::string& ending)
 {
-    const std::filesystem::path oFile(fileName);
-    return FindBeside(oFile, oFile.filename().string(), ending);
+    const auto [folder, name] = SplitName(fileName);
+    return FindBeside(folder, name, ending);
+}
+
+std::vector<std::string> ListCompanions(const std::string& fileName)
+{
+    const auto [folder, base] = SplitName(fileName);
+    std::vector<std::string> oFound;
+    for (const std::string ending : {LEVELS_ENDING, MASK_ENDING, AUX_XML_ENDING})
+        for (const std::string& name : ListNames(base, ending))
+        {
+            const std::string other = name.substr(0, base.size());
+            if ((other == base || !IsFile(folder + other)) && IsFile(folder + name))
+                oFound.push_back(folder + name);
+        }
+    return oFound;
 }
 
 std::string ReadSidecar(const std::string& sidecar, std::size_t nMaximum)

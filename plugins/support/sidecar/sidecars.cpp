@@ -1,5 +1,6 @@
 #include "plugins/support/sidecar/sidecars.h"
 
+#include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/irasterdataset.h"
@@ -7,10 +8,12 @@
 #include "datasources/interfaces/windowedio.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "gobs/raster/datatype.h"
+#include "plugins/support/sidecar/modelsidecars.h"
 #include "plugins/support/sidecar/sidecarfile.h"
 #include "plugins/support/sidecar/worldfile.h"
 #include "plugins/support/writing/newfile.h"
 #include "toolkit/core/lettercase.h"
+#include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/ogc/cs/crsfactory.h"
@@ -19,6 +22,8 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <functional>
+#include <utility>
 
 namespace krv::plugins::support
 {
@@ -32,9 +37,11 @@ using krv::ogc::cs::ICRS;
 namespace
 {
 
-constexpr char AUX_XML[] = ".aux.xml";
-constexpr char MASK[] = ".msk";
 constexpr char PROJECTION[] = ".prj";
+constexpr char MASK_FLAGS[] = "INTERNAL_MASK_FLAGS_"; // and the number of the mask
+constexpr unsigned int FLAG_ALL_VALID = 1;
+constexpr unsigned int FLAG_OF_IMAGE = 2;
+constexpr unsigned int WRITTEN_MODEL = 1;
 constexpr char NO_DATA[] = "NO_DATA_VALUE";
 constexpr std::size_t MOST_TEXT_BYTES = std::size_t{1} << 20;
 constexpr std::size_t MOST_XML_BYTES = std::size_t{16} << 20;
@@ -58,7 +65,11 @@ std::optional<AuxXml::Stamp> FindStamp(const std::string& fileName)
 class MaskIO : public krv::datasources::WindowedIO<krv::datasources::IRasterIO>
 {
 public:
-    explicit MaskIO(std::unique_ptr<krv::datasources::IRasterIO> poBytes) : mpoBytes(std::move(poBytes)) {}
+    // oChange: called before each change.
+    MaskIO(std::unique_ptr<krv::datasources::IRasterIO> poBytes, std::function<void()> oChange)
+        : mpoBytes(std::move(poBytes)), moChange(std::move(oChange))
+    {
+    }
     ~MaskIO() override = default;
 
     unsigned int GetFileWidth() const override { return mpoBytes->GetFileWidth(); }
@@ -79,6 +90,7 @@ private:
     void WritePixels(const krv::datasources::PixelRect& oRect, const unsigned char* pSource,
                      std::size_t nPitch) override
     {
+        moChange();
         std::vector<unsigned char> oBytes(std::size_t{oRect.mnWidth} * oRect.mnHeight);
         for (std::size_t nRow = 0; nRow < oRect.mnHeight; ++nRow)
             std::transform(pSource + nRow * nPitch, pSource + nRow * nPitch + oRect.mnWidth,
@@ -88,21 +100,28 @@ private:
     }
 
     std::unique_ptr<krv::datasources::IRasterIO> mpoBytes;
+    std::function<void()> moChange;
 };
 
-// Why a file is no mask of an image; empty when it is one.
-std::string FindMaskFault(krv::datasources::IDataset* poMask, unsigned int nWidth, unsigned int nHeight)
+// One that cannot be changed is read, and refuses changes itself.
+std::unique_ptr<krv::datasources::IDataset> OpenForUpdate(const std::string& fileName)
 {
-    auto* const poRaster = dynamic_cast<IRasterDataset*>(poMask);
-    if (poRaster == nullptr || poRaster->GetChanCount() == 0)
-        return "holds no image";
-    if (poRaster->GetWidth() != nWidth || poRaster->GetHeight() != nHeight)
-        return "is of " + std::to_string(poRaster->GetWidth()) + " x " + std::to_string(poRaster->GetHeight()) +
-               " pixels, the image of " + std::to_string(nWidth) + " x " + std::to_string(nHeight);
-    if (poRaster->GetChanCount() != 1)
-        return "has a mask for each of several channels";
-    const std::unique_ptr<krv::datasources::IChannelInfo> poInfo(poRaster->GetChannelInfo(1));
-    return poInfo->GetDataType() == krv::gobs::DataType(krv::gobs::eDT_8U) ? "" : "is not of bytes";
+    auto* const poManager = krv::datasources::DatasetManager::GetInstance();
+    try
+    {
+        return std::unique_ptr<krv::datasources::IDataset>(poManager->Open(fileName, eUpdate));
+    }
+    catch (const Exception&)
+    {
+        return std::unique_ptr<krv::datasources::IDataset>(poManager->Open(fileName, eReadOnly));
+    }
+}
+
+// The generic format says why not.
+bool HasUsableLevels(const std::string& fileName)
+{
+    auto* const poManager = krv::datasources::DatasetManager::GetInstance();
+    return std::unique_ptr<krv::datasources::IDataset>(poManager->OpenFormat("GDBALL", fileName, eReadOnly)) != nullptr;
 }
 
 void AddMissing(const MetadataMap& oFrom, MetadataMap& oTo, bool bNoData)
@@ -142,7 +161,7 @@ const AuxXml& Sidecars::LoadAuxXml()
     moAuxXml.emplace(mnChannels);
     if (mbNone)
         return *moAuxXml;
-    moAuxXmlName = FindAppended(moFileName, AUX_XML);
+    moAuxXmlName = FindAppended(moFileName, AUX_XML_ENDING);
     if (moAuxXmlName.empty())
         return *moAuxXml;
     try
@@ -225,82 +244,201 @@ void Sidecars::AddTags(AuxiliaryData& oRecord)
     }
 }
 
-bool Sidecars::HasMask()
+void Sidecars::LoadMasks()
 {
     if (moMaskName)
-        return mpoMask != nullptr;
-    moMaskName = mbNone ? std::string() : FindAppended(moFileName, MASK);
+        return;
+    moMaskName = mbNone ? std::string() : FindAppended(moFileName, MASK_ENDING);
     if (moMaskName->empty())
-        return false;
+        return;
     try
     {
         mpoMask.reset(krv::datasources::DatasetManager::GetInstance()->Open(*moMaskName, eReadOnly));
-        const std::string fault = FindMaskFault(mpoMask.get(), mnWidth, mnHeight);
+        const std::string fault = FindMasks();
         if (fault.empty())
-            return true;
+            return;
         Complain(*moMaskName, "it " + fault);
     }
     catch (const Exception& oError)
     {
         Complain(*moMaskName, oError.what());
     }
+    moMasks.clear();
     mpoMask.reset();
-    return false;
 }
 
-krv::datasources::IRasterIO* Sidecars::OpenMask(bool bWrite)
+std::string Sidecars::FindMasks()
 {
-    if (!HasMask())
-        throw DataException(moFileName + ": no mask lies beside it");
+    const auto* const poRaster = dynamic_cast<IRasterDataset*>(mpoMask.get());
+    const unsigned int nMasks = poRaster != nullptr ? poRaster->GetChanCount() : 0;
+    if (nMasks == 0)
+        return "holds no image";
+    if (poRaster->GetWidth() != mnWidth || poRaster->GetHeight() != mnHeight)
+        return "is of " + std::to_string(poRaster->GetWidth()) + " x " + std::to_string(poRaster->GetHeight()) +
+               " pixels, the image of " + std::to_string(mnWidth) + " x " + std::to_string(mnHeight);
+    if (nMasks != 1 && nMasks != mnChannels)
+        return "has masks of " + std::to_string(nMasks) + " channels, the image has " + std::to_string(mnChannels);
+    for (unsigned int nMask = 1; nMask <= nMasks; ++nMask)
+        if (std::unique_ptr<krv::datasources::IChannelInfo>(poRaster->GetChannelInfo(nMask))->GetDataType() !=
+            krv::gobs::DataType(krv::gobs::eDT_8U))
+            return "is not of bytes";
+    const AuxiliaryData oTags = mpoMask->ReadAuxiliaryData();
+    const auto GetFlags = [&oTags](unsigned int nMask)
+    {
+        const std::string text = oTags.GetFileMetadataValue(MASK_FLAGS + std::to_string(nMask));
+        return krv::ParseNumber<unsigned int>(text).value_or(0);
+    };
+    mbByChannel = nMasks > 1 && (GetFlags(1) & FLAG_OF_IMAGE) == 0;
+    for (unsigned int nMask = 1; nMask <= (mbByChannel ? nMasks : 1); ++nMask)
+        if ((GetFlags(nMask) & FLAG_ALL_VALID) == 0)
+            moMasks.push_back(nMask);
+    return {};
+}
+
+std::vector<unsigned int> Sidecars::ListMasks()
+{
+    LoadMasks();
+    return moMasks;
+}
+
+bool Sidecars::HasMask(unsigned int nMask)
+{
+    LoadMasks();
+    return std::find(moMasks.begin(), moMasks.end(), nMask) != moMasks.end();
+}
+
+std::string Sidecars::DescribeMask(unsigned int nMask)
+{
+    if (HasMask(nMask) && mbByChannel)
+        return "Validity of channel " + std::to_string(nMask);
+    return mbZone ? "Bitmap 1" : "";
+}
+
+MetadataMap Sidecars::GetMaskTags(unsigned int nMask)
+{
+    if (!HasMask(nMask) || !mbByChannel)
+        return {};
+    return {{krv::datasources::VALIDITY_OF_CHANNEL, std::to_string(nMask)}};
+}
+
+krv::datasources::IRasterIO* Sidecars::OpenMask(unsigned int nMask, bool bWrite)
+{
+    if (!HasMask(nMask))
+        throw DataException(moFileName + ": no mask " + std::to_string(nMask) + " lies beside it");
     if (bWrite && !mbMaskWritten)
     {
         mpoMask.reset();
-        mpoMask.reset(krv::datasources::DatasetManager::GetInstance()->Open(*moMaskName, eUpdate));
+        mpoMask = OpenForUpdate(*moMaskName);
         mbMaskWritten = true;
     }
+    const auto Change = [this]
+    {
+        mbMaskChanged = true;
+    };
     return new MaskIO(
-        std::unique_ptr<krv::datasources::IRasterIO>(dynamic_cast<IRasterDataset&>(*mpoMask).GetRasterIO({1})));
+        std::unique_ptr<krv::datasources::IRasterIO>(dynamic_cast<IRasterDataset&>(*mpoMask).GetRasterIO({nMask})),
+        Change);
 }
 
 void Sidecars::MakeMask()
 {
-    if (HasMask())
+    if (!ListMasks().empty())
         throw DataException(moFileName + ": a mask lies beside it already");
-    const std::string name = moFileName + MASK;
+    const std::string name = moFileName + MASK_ENDING;
     mpoMask.reset(krv::datasources::DatasetManager::GetInstance()->NewDataset(name, "TIF", "COMPRESS=DEFLATE"));
     auto* const poRaster = dynamic_cast<IRasterDataset*>(mpoMask.get());
     if (poRaster == nullptr)
         throw DataException(name + ": a mask cannot be made");
     poRaster->Create(mnWidth, mnHeight, {krv::gobs::DataType(krv::gobs::eDT_8U)});
     AuxiliaryData oTags(1);
-    oTags.SetFileMetadataValue("INTERNAL_MASK_FLAGS_1", "2");
+    oTags.SetFileMetadataValue(MASK_FLAGS + std::string("1"), std::to_string(FLAG_OF_IMAGE));
     mpoMask->WriteAuxiliaryData(oTags);
     moMaskName = name;
-    mbMaskWritten = true;
+    moMasks = {1};
+    mbByChannel = false;
+    mbMaskWritten = mbMaskChanged = mbZone = true;
 }
 
 // One that was just made goes without a trace.
-void Sidecars::DropMask()
+void Sidecars::DropMasks()
 {
-    if (!HasMask())
+    if (ListMasks().empty())
         return;
     mpoMask->Delete();
     mpoMask.reset();
     moMaskName.emplace();
-    mbMaskWritten = false;
+    moMasks.clear();
+    mbMaskWritten = mbMaskChanged = mbZone = false;
 }
 
-void Sidecars::StoreMask()
+std::vector<unsigned int> Sidecars::ListModels() const
 {
-    if (mpoMask && mbMaskWritten)
-        mpoMask->Synchronize();
+    std::vector<unsigned int> oList = mbNone ? std::vector<unsigned int>() : FindModelSidecars(moFileName);
+    if (moModel && (oList.empty() || oList.front() != WRITTEN_MODEL))
+        oList.insert(oList.begin(), WRITTEN_MODEL);
+    return oList;
+}
+
+unsigned int Sidecars::SetModel(const krv::mathmodel::RpcCoefficients& oModel)
+{
+    moModel = oModel;
+    return WRITTEN_MODEL;
+}
+
+krv::mathmodel::RpcCoefficients Sidecars::ReadModel(unsigned int nModel) const
+{
+    return moModel && nModel == WRITTEN_MODEL ? *moModel : ReadModelSidecar(moFileName, nModel);
 }
 
 void Sidecars::SetAuxXml(AuxXml oAuxXml)
 {
     LoadAuxXml();
+    if (const auto oTrouble = moTroubles.find(moAuxXmlName); oTrouble != moTroubles.end())
+    {
+        if (oAuxXml.IsEmpty())
+            return;
+        throw DataException(moAuxXmlName + " is not replaced, since it cannot be used: " + oTrouble->second +
+                            "; remove it first");
+    }
     moAuxXml = std::move(oAuxXml);
     mbAuxXmlChanged = true;
+    mbForgotten = false;
+}
+
+void Sidecars::ForgetPixels()
+{
+    if (mbForgotten)
+        return;
+    AuxXml oAuxXml = LoadAuxXml();
+    const bool bCurrent = oAuxXml.GetStamp() && oAuxXml.GetStamp() == FindStamp(moFileName);
+    if (oAuxXml.DropStatistics() || bCurrent)
+        SetAuxXml(std::move(oAuxXml));
+    mbForgotten = true;
+}
+
+void Sidecars::CheckStore() const
+{
+    if (mbZone)
+        throw DataException(moFileName +
+                            ": a zone cannot be kept beside the file: a bitmap without a description, the validity "
+                            "mask, can");
+}
+
+bool Sidecars::HoldsChanges() const
+{
+    return mbMaskChanged || mbAuxXmlChanged || moModel;
+}
+
+void Sidecars::Store()
+{
+    CheckStore();
+    if (mbMaskChanged)
+        mpoMask->Synchronize();
+    mbMaskChanged = false;
+    if (moModel)
+        WriteModelSidecar(moFileName, *moModel);
+    moModel.reset();
+    StoreAuxXml();
 }
 
 void Sidecars::StoreAuxXml()
@@ -308,7 +446,7 @@ void Sidecars::StoreAuxXml()
     if (!mbAuxXmlChanged)
         return;
     if (moAuxXmlName.empty())
-        moAuxXmlName = moFileName + AUX_XML;
+        moAuxXmlName = moFileName + AUX_XML_ENDING;
     if (moAuxXml->IsEmpty())
         std::remove(moAuxXmlName.c_str());
     else
@@ -344,16 +482,19 @@ std::vector<krv::datasources::Sidecar> Sidecars::List(const Needs& oNeeds)
     const auto oStamp = FindStamp(moFileName);
     ReadGeocoding();
     ReadCRS();
-    HasMask();
+    LoadMasks();
     Add(moAuxXmlName, "metadata", oNeeds.mbTags, false);
     if (!moAuxXmlName.empty() && oAuxXml.GetStamp() && oStamp && *oAuxXml.GetStamp() != *oStamp)
         oList.back().moTrouble = "the file changed after it was written";
     Add(FindWorldFile(), "geocoding", oNeeds.mbGeocoding && !oAuxXml.GetGeocoding(), false);
     Add(FindSidecar(moFileName, PROJECTION), "reference system", oNeeds.mbCRS && oAuxXml.GetCRS().empty(), false);
-    Add(*moMaskName, "mask", oNeeds.mbMask && mpoMask != nullptr, true);
+    Add(*moMaskName, "mask", oNeeds.mbMask && !moMasks.empty(), true);
     for (const char* const pEnding : {"_RPC.TXT", ".rpb"})
         Add(FindSidecar(moFileName, pEnding), "sensor model", oNeeds.mbTags, false);
-    Add(FindAppended(moFileName, ".ovr"), "levels", true, true);
+    const std::string levels = FindAppended(moFileName, LEVELS_ENDING);
+    if (!levels.empty() && !HasUsableLevels(moFileName))
+        moTroubles.emplace(levels, "it holds no levels of the image");
+    Add(levels, "levels", oNeeds.mbLevels, true);
     return oList;
 }
 

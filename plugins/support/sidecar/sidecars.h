@@ -3,6 +3,7 @@
 #include "datasources/interfaces/isidecardataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "plugins/support/sidecar/auxxml.h"
+#include "toolkit/mathmodel/rpccoefficients.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 #include "toolkit/ogc/cs/icrs.h"
 
@@ -20,6 +21,9 @@ class IRasterIO;
 
 namespace krv::plugins::support
 {
+
+// What is added to the numbers of masks, and of models, where the format counts its own from 1 on.
+inline constexpr unsigned int FIRST_BESIDE = 65535;
 
 // The files beside an image that say what its own file does not. Each is looked for by its exact names when somebody
 // asks for what it says, and read once. One that cannot be used is warned of and is as if it were not there. A file
@@ -39,34 +43,59 @@ public:
     std::unique_ptr<krv::ogc::cs::ICRS> ReadCRS();
     // Adds what a record lacks: tags, descriptions, and no-data values where neither the channel nor the file has one.
     void AddTags(krv::datasources::AuxiliaryData& oRecord);
-    // Whether ".msk" says which pixels are valid, and its pixels as those of a bitmap: 1 is valid. They are the
-    // caller's and go before this object.
-    bool HasMask();
-    krv::datasources::IRasterIO* OpenMask(bool bWrite);
-    // A mask of no valid pixel, which is there for others after StoreMask, and one that is no more.
+    // The masks of ".msk" by their numbers: 1 for one of the image; where each channel has its own, those of the
+    // channels; none when it says of no pixel that it is not valid.
+    std::vector<unsigned int> ListMasks();
+    bool HasMask(unsigned int nMask);
+    // Empty for the image's own; one of a channel is a zone but for the tag that says of which channel it is.
+    std::string DescribeMask(unsigned int nMask);
+    krv::datasources::MetadataMap GetMaskTags(unsigned int nMask);
+    // Its pixels as those of a bitmap: 1 is valid. They are the caller's and go before this object.
+    krv::datasources::IRasterIO* OpenMask(unsigned int nMask, bool bWrite);
+    // A mask of the image of no valid pixel, which is there for others after Store. It is a zone, which cannot be
+    // stored, until DeclareMask.
     void MakeMask();
-    void DropMask();
-    void StoreMask();
+    void DeclareMask() { mbZone = false; }
+    bool IsZone() const { return mbZone; }
+    // All of them.
+    void DropMasks();
 
-    // What ".aux.xml" says; what is set counts at once, and StoreAuxXml replaces the file as a whole, or removes one
-    // that says nothing.
+    // Sensor models, by the numbers of FindModelSidecars; one that is set is written by Store.
+    std::vector<unsigned int> ListModels() const;
+    krv::mathmodel::RpcCoefficients ReadModel(unsigned int nModel) const;
+    unsigned int SetModel(const krv::mathmodel::RpcCoefficients& oModel);
+
+    // What ".aux.xml" says; what is set counts at once, and Store replaces the file as a whole, or removes one that
+    // says nothing. Setting throws DataException where there is a file that cannot be used, which would be lost.
     const AuxXml& GetAuxXml() { return LoadAuxXml(); }
     void SetAuxXml(AuxXml oAuxXml);
-    void StoreAuxXml();
+    // Before pixels change: what ".aux.xml" says of their values goes, and it is still of this file afterwards. Costs
+    // nothing the second time.
+    void ForgetPixels();
+
+    // Throws DataException for what Store cannot keep.
+    void CheckStore() const;
+    bool HoldsChanges() const;
+    void Store();
 
     // All that lie beside the file, each with what came of it, those included that nobody asked for. oNeeds: whether
-    // the file's own says nothing of the geocoding, of the system and of validity.
+    // the file's own says nothing of the geocoding, of the system, of validity, and has no levels.
     struct Needs
     {
         bool mbTags = false; // the format adds tags and sensor models
         bool mbGeocoding = false;
         bool mbCRS = false;
         bool mbMask = false;
+        bool mbLevels = false;
     };
     std::vector<krv::datasources::Sidecar> List(const Needs& oNeeds);
 
 private:
     const AuxXml& LoadAuxXml();
+    void StoreAuxXml();
+    void LoadMasks();
+    // Why the file that is open is no mask of the image; empty when it is one, whose masks are then known.
+    std::string FindMasks();
     bool IsOlder(const std::string& sidecar) const;
     void Complain(const std::string& sidecar, const std::string& trouble);
     std::string FindWorldFile() const;
@@ -80,8 +109,14 @@ private:
     std::string moAuxXmlName; // as found; empty when there is none
     bool mbAuxXmlChanged = false;
     std::optional<std::string> moMaskName; // as found, once it was looked for
-    bool mbMaskWritten = false;
     std::unique_ptr<krv::datasources::IDataset> mpoMask;
+    std::vector<unsigned int> moMasks; // their numbers
+    bool mbByChannel = false;
+    bool mbMaskWritten = false;
+    bool mbMaskChanged = false;
+    bool mbZone = false;
+    std::optional<krv::mathmodel::RpcCoefficients> moModel; // to be written
+    bool mbForgotten = false;
     std::map<std::string, std::string> moTroubles; // by sidecar
 };
 

@@ -1,8 +1,13 @@
 #include "plugins/support/writing/filewriter.h"
 
+#include "plugins/support/file/scratchfile.h"
+#include "plugins/support/sidecar/sidecarfile.h"
+#include "plugins/support/writing/setaside.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <utility>
+
+#include <sys/stat.h>
 
 namespace krv::plugins::support
 {
@@ -26,6 +31,12 @@ void FileWriter::MakeFile()
 {
     mpoNew = std::make_unique<NewFile>(moFileName, mbReplaces);
     mpoFile = mpoNew->GetFile();
+}
+
+void FileWriter::MakeScratch(const Place& oPlace)
+{
+    const NewFile oTrial(moFileName, mbReplaces, oPlace);
+    mpoFile = MakeScratchFile(moFileName, oPlace);
 }
 
 void FileWriter::RemoveFile() noexcept
@@ -52,8 +63,17 @@ void FileWriter::Synchronize()
 
 void FileWriter::GiveName()
 {
-    mpoNew->TakeName(mbReplaces);
+    TakeName(*mpoNew);
     SetNamed();
+}
+
+void FileWriter::TakeName(NewFile& oNew) const
+{
+    struct stat oStatus = {};
+    const bool bTaken = !TakesPlace() && ::lstat(moFileName.c_str(), &oStatus) == 0; // which is told below
+    SetAside oOld(mbNamed || bTaken ? std::vector<std::string>() : ListCompanions(moFileName));
+    oNew.TakeName(TakesPlace());
+    oOld.Drop();
 }
 
 void FileWriter::Finish()

@@ -50,8 +50,14 @@ protected:
     virtual bool HoldsChanges() const = 0;
     // Gives a new file that is whole its name.
     virtual void GiveName();
+    // Gives one that takes the place of this file, or of an older one of the name, that name. The levels, masks and
+    // tags that lie beside the name of an older one go with it: they would be taken for this one's.
+    void TakeName(NewFile& oNew) const;
 
     void MakeFile();
+    // In place of it: a file without a name for what is written, in the folder of scratch files, of which Store makes
+    // that which takes the name. Throws as NewFile when that could not be made.
+    void MakeScratch(const Place& oPlace = Place::Current());
     // Back to before MakeFile.
     void RemoveFile() noexcept;
     // Ends writing, without storing anything.

@@ -19,9 +19,15 @@ PixelRect Intersect(const PixelRect& oFirst, const PixelRect& oSecond)
     return {nX, nY, nRight - nX, nBottom - nY};
 }
 
-HeldBlocks::HeldBlocks(std::size_t nBound, std::size_t nPixelBytes, StoreBlock oStore, Samples eSamples)
-    : mnBound(nBound), mnPixelBytes(nPixelBytes), meSamples(eSamples), moStore(std::move(oStore))
+HeldBlocks::HeldBlocks(std::size_t nBound, std::size_t nPixelBytes, StoreBlock oStore, SettlePixels oSettle)
+    : mnBound(nBound), mnPixelBytes(nPixelBytes), moSettle(std::move(oSettle)), moStore(std::move(oStore))
 {
+}
+
+void HeldBlocks::SettleBits(unsigned char* pPixels, std::size_t nBytes)
+{
+    std::transform(pPixels, pPixels + nBytes, pPixels,
+                   [](unsigned char nByte) { return static_cast<unsigned char>(nByte != 0); });
 }
 
 void HeldBlocks::Write(const Block& oBlock, const PixelRect& oPart, const unsigned char* pSource, std::size_t nPitch,
@@ -32,10 +38,8 @@ void HeldBlocks::Write(const Block& oBlock, const PixelRect& oPart, const unsign
                                  (oPart.mnX - oBlock.moRect.mnX) * mnPixelBytes;
     const std::size_t nRowBytes = oPart.mnWidth * mnPixelBytes;
     raster::CopyRows(pSource, nPitch, pHeld, nHeldPitch, nRowBytes, oPart.mnHeight);
-    if (meSamples == Samples::eBits)
-        for (unsigned int nRow = 0; nRow < oPart.mnHeight; ++nRow)
-            std::transform(pHeld + nRow * nHeldPitch, pHeld + nRow * nHeldPitch + nRowBytes, pHeld + nRow * nHeldPitch,
-                           [](unsigned char nByte) { return static_cast<unsigned char>(nByte != 0); });
+    for (unsigned int nRow = 0; moSettle && nRow < oPart.mnHeight; ++nRow)
+        moSettle(pHeld + nRow * nHeldPitch, nRowBytes);
 }
 
 void HeldBlocks::Overlay(std::uint64_t nBlock, const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) const

@@ -31,14 +31,12 @@ public:
     // Fills in what the file has of it; the memory holds 0.
     using ReadBlock = std::function<void(unsigned char* pPixels, std::size_t nPitch)>;
 
-    // Of single bits, a byte each, any byte but 0 is one that is set: it is held as 1, as it reads when it is stored.
-    enum class Samples
-    {
-        eValues,
-        eBits
-    };
+    // Makes pixels in a row what they read as when they are stored, where a file does not hold every value.
+    using SettlePixels = std::function<void(unsigned char* pPixels, std::size_t nBytes)>;
+    // Of single bits, a byte each: any byte but 0 is one that is set, and reads as 1.
+    static void SettleBits(unsigned char* pPixels, std::size_t nBytes);
 
-    HeldBlocks(std::size_t nBound, std::size_t nPixelBytes, StoreBlock oStore, Samples eSamples = Samples::eValues);
+    HeldBlocks(std::size_t nBound, std::size_t nPixelBytes, StoreBlock oStore, SettlePixels oSettle = nullptr);
 
     bool IsEmpty() const { return moHeld.empty(); }
     // Takes a part of a block, as a rectangle of the image.
@@ -64,7 +62,7 @@ private:
 
     std::size_t mnBound;
     std::size_t mnPixelBytes;
-    Samples meSamples;
+    SettlePixels moSettle; // may be empty
     StoreBlock moStore;
     std::size_t mnHeldBytes = 0;
     std::list<Held> moHeld; // the one used last first

@@ -15,8 +15,7 @@ namespace krv::plugins::support
 namespace
 {
 
-// The name is of no length that a folder does not take.
-std::string MakeTemporaryName(const std::string& fileName, bool bReplace, const Place& oPlace)
+void CheckName(const std::string& fileName, bool bReplace, const Place& oPlace)
 {
     struct stat oStatus = {};
     if (fileName.empty() || fileName.back() == '/')
@@ -37,15 +36,28 @@ std::string MakeTemporaryName(const std::string& fileName, bool bReplace, const 
                                         oPlace);
         throw IOException(fileName, fileName + ": cannot be created: " + SystemErrorText(errno), oPlace);
     }
-    static std::atomic<unsigned int> nCounter = 0;
-    return fileName.substr(0, nBegin) + "." + fileName.substr(nBegin, 200) + "." + std::to_string(::getpid()) + "." +
-           std::to_string(nCounter++) + ".part";
+}
+
+std::string MakeCheckedName(const std::string& fileName, bool bReplace, const Place& oPlace)
+{
+    CheckName(fileName, bReplace, oPlace);
+    return MakeTemporaryName(fileName);
 }
 
 } // namespace
 
+// The name is of no length that a folder does not take.
+std::string MakeTemporaryName(const std::string& fileName)
+{
+    static std::atomic<unsigned int> nCounter = 0;
+    const std::size_t nSlash = fileName.rfind('/');
+    const std::size_t nBegin = nSlash == std::string::npos ? 0 : nSlash + 1;
+    return fileName.substr(0, nBegin) + "." + fileName.substr(nBegin, 200) + "." + std::to_string(::getpid()) + "." +
+           std::to_string(nCounter++) + ".part";
+}
+
 NewFile::NewFile(const std::string& fileName, bool bReplaces, const Place& oPlace)
-    : moFileName(fileName), moTemporary(MakeTemporaryName(fileName, bReplaces, oPlace)),
+    : moFileName(fileName), moTemporary(MakeCheckedName(fileName, bReplaces, oPlace)),
       mpoFile(std::make_shared<File>(moTemporary, File::Mode::eCreate, oPlace))
 {
     mpoFile->ShowAs(fileName);

@@ -8,6 +8,9 @@
 namespace krv::plugins::support
 {
 
+// A name in the folder of a file, of this process alone and of no length that a folder does not take.
+std::string MakeTemporaryName(const std::string& fileName);
+
 // A file that comes into being: under a temporary name in its folder, of this process alone, until it is whole and
 // takes its own. One that goes before is removed. The temporary name is .NAME.PROCESS.COUNT.part: so it lies on the
 // file system of its name, is cleared away by hand after a crash, and is taken for an image by nobody.

@@ -2,14 +2,43 @@
 
 #include "plugins/tif/reading/tiffvalues.h"
 
-#include <xtiffio.h>
+#include <tiffio.h>
+
+#include <cstdint>
+#include <iterator>
 
 namespace krv::plugins::tif
 {
 
+namespace
+{
+
+TIFFExtendProc spBefore = nullptr;
+
+void AddGeoTags(TIFF* poFile)
+{
+    // The names are those that the library's messages call them by.
+    static const auto Field = [](std::uint32_t nTag, TIFFDataType eType, const char* pName)
+    {
+        return TIFFFieldInfo{nTag, TIFF_VARIABLE,       TIFF_VARIABLE,           eType, FIELD_CUSTOM,
+                             1,    eType != TIFF_ASCII, const_cast<char*>(pName)};
+    };
+    static const TIFFFieldInfo FIELDS[] = {Field(support::TAG_GEO_SCALE, TIFF_DOUBLE, "GeoPixelScale"),
+                                           Field(support::TAG_GEO_TIE_POINTS, TIFF_DOUBLE, "GeoTiePoints"),
+                                           Field(support::TAG_GEO_MATRIX, TIFF_DOUBLE, "GeoTransformationMatrix"),
+                                           Field(support::TAG_GEO_KEYS, TIFF_SHORT, "GeoKeyDirectory"),
+                                           Field(support::TAG_GEO_DOUBLES, TIFF_DOUBLE, "GeoDoubleParams"),
+                                           Field(support::TAG_GEO_TEXTS, TIFF_ASCII, "GeoASCIIParams")};
+    TIFFMergeFieldInfo(poFile, FIELDS, std::size(FIELDS));
+    if (spBefore != nullptr)
+        spBefore(poFile);
+}
+
+} // namespace
+
 void RegisterGeoTags()
 {
-    static const bool bDone = (XTIFFInitialize(), true);
+    static const bool bDone = (spBefore = TIFFSetTagExtender(&AddGeoTags), true);
     static_cast<void>(bDone);
 }
 

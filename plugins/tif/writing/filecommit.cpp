@@ -1,4 +1,5 @@
 // FileEditor: how changes become the file's.
+#include "plugins/support/file/copypieces.h"
 #include "plugins/tif/reading/cloudheader.h"
 #include "plugins/tif/writing/directorybytes.h"
 #include "plugins/tif/writing/fileeditor.h"
@@ -17,7 +18,7 @@ namespace
 
 // A file up to this size costs little to be written twice.
 constexpr std::uint64_t SMALL_FILE = std::uint64_t{4} << 20;
-constexpr std::size_t COPY_BYTES = std::size_t{1} << 20;
+constexpr std::size_t COPIED_PIECES = 4096;
 
 // A page with the places that it gets.
 struct Placed
@@ -85,28 +86,28 @@ void Enclose(const Extent& oBlock, support::File& oTarget)
 }
 
 void CopyBlocks(Placed& oPlaced, const support::File& oSource, support::Space& oSpace, support::File& oTarget,
-                bool bEnclosed)
+                bool bEnclosed, support::Scratch& oScratch)
 {
     const std::uint64_t nBefore = bEnclosed ? CloudHeader::LEADER_BYTES : 0;
     const std::uint64_t nAround = bEnclosed ? nBefore + CloudHeader::TRAILER_BYTES : 0;
-    std::vector<unsigned char> oBytes;
+    std::vector<Extent> oEnclosed;
     PageModel& oPage = oPlaced.moPage;
+    std::vector<support::CopiedPiece> oPieces;
     for (std::size_t nAt = 0; nAt < oPage.GetStriles(); ++nAt)
     {
         const std::uint64_t nBytes = oPage.moByteCounts[nAt];
-        oPage.moOffsets[nAt] = 0;
-        if (nBytes == 0)
+        oPage.moOffsets[nAt] = nBytes == 0 ? 0 : oSpace.Allocate(nBytes + nAround).mnOffset + nBefore;
+        if (nBytes != 0 && bEnclosed)
+            oEnclosed.push_back({oPage.moOffsets[nAt], nBytes, 0});
+        if (nBytes != 0)
+            oPieces.push_back({oPlaced.mpOld->moOffsets[nAt], oPage.moOffsets[nAt], nBytes});
+        if (oPieces.size() < COPIED_PIECES && nAt + 1 < oPage.GetStriles())
             continue;
-        const Extent oNew = {oSpace.Allocate(nBytes + nAround).mnOffset + nBefore, nBytes, 0};
-        for (std::uint64_t nDone = 0; nDone < nBytes; nDone += oBytes.size())
-        {
-            oBytes.resize(std::min<std::uint64_t>(nBytes - nDone, COPY_BYTES));
-            oSource.Read(oPlaced.mpOld->moOffsets[nAt] + nDone, oBytes.data(), oBytes.size());
-            oTarget.Write(oNew.mnOffset + nDone, oBytes.data(), oBytes.size());
-        }
-        if (bEnclosed)
-            Enclose(oNew, oTarget);
-        oPage.moOffsets[nAt] = oNew.mnOffset;
+        support::CopyPieces(oSource, oTarget, std::move(oPieces), oScratch);
+        oPieces.clear();
+        for (const Extent& oBlock : oEnclosed)
+            Enclose(oBlock, oTarget);
+        oEnclosed.clear();
     }
 }
 
@@ -148,8 +149,9 @@ void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, con
                           "the file would pass the limit of 4 GiB of classic TIFF");
     for (Placed& oPlaced : oSorted)
         PlaceDirectory(oPlaced, oHeader, &oPlaced == oSorted.data() ? support::RoomRecord::GetBytes(0) : 0, oSpace);
+    support::Scratch oScratch;
     for (auto oPlaced = oSorted.rbegin(); oPlaced != oSorted.rend(); ++oPlaced)
-        CopyBlocks(*oPlaced, oSource, oSpace, oTarget, bEnclosed);
+        CopyBlocks(*oPlaced, oSource, oSpace, oTarget, bEnclosed, oScratch);
     for (std::size_t nAt = 0; nAt < oSorted.size(); ++nAt)
         WriteDirectory(oSorted[nAt], oHeader,
                        nAt + 1 < oSorted.size() ? oSorted[nAt + 1].moPage.moDirectory.mnOffset : 0, oTarget);
@@ -305,7 +307,12 @@ void FileEditor::Finish()
     CheckWritable();
     if (!HasFile())
         return End();
-    Store();
+    // A file that has no name yet and gets its order anew need not reach the disk before that.
+    const bool bOnlyLaidOut = moOptions.mbCloud && !IsNamed();
+    if (bOnlyLaidOut)
+        StoreHeld();
+    else
+        Store();
     if (!moOptions.mbCloud && !IsWasteful())
     {
         Synchronize();
@@ -321,7 +328,7 @@ void FileEditor::Finish()
     support::NewFile oLaidOut(GetFileName(), TakesPlace());
     WriteCloudLayout(moPages, moHeader, *GetFile(), *oLaidOut.GetFile(), moOptions.mbCloud);
     oLaidOut.GetFile()->Flush();
-    oLaidOut.TakeName(TakesPlace());
+    TakeName(oLaidOut);
     SetNamed();
     End();
 }
@@ -357,15 +364,17 @@ void FileEditor::MarkChanged()
 }
 
 // What was written reaches the disk before the one number that makes it the file's, and that before anything of the
-// former state is given up.
+// former state is given up. A new file is nobody's until it has its name: all of it reaches the disk at once.
 void FileEditor::Publish(const std::vector<Written>& oWritten)
 {
     const Written& oFirst = oWritten.back();
     const bool bFirst = oFirst.mpPage == moPages.front().get();
+    const bool bNew = !IsNamed();
     try
     {
         MarkChanged();
-        GetFile()->Flush();
+        if (!bNew)
+            GetFile()->Flush();
     }
     catch (...)
     {
@@ -378,7 +387,6 @@ void FileEditor::Publish(const std::vector<Written>& oWritten)
     unsigned char aHeader[FileHeader::BYTES] = {};
     moHeader.Write(aHeader, moHeader.mnFirstDirectory);
     const std::size_t nPlace = moHeader.mbBigTiff ? 8 : 4;
-    const bool bNew = !IsNamed();
     GetFile()->Write(bNew ? 0 : nPlace, aHeader + (bNew ? 0 : nPlace), moHeader.GetBytes() - (bNew ? 0 : nPlace));
     GetFile()->Flush();
 

@@ -1,5 +1,6 @@
 #include "plugins/tif/writing/fileeditor.h"
 
+#include "plugins/support/file/copypieces.h"
 #include "plugins/tif/writing/pagewriter.h"
 #include "toolkit/exceptions/exceptions.h"
 
@@ -213,6 +214,36 @@ void FileEditor::StoreStrile(PageModel& oPage, std::uint64_t nStrile, const unsi
         throw;
     }
     MoveStrile(oPage, nStrile, oOld, oNew, nBytes);
+}
+
+void FileEditor::CopyStriles(PageModel& oPage, const support::File& oSource, const std::vector<CodedStrile>& oStriles)
+{
+    CheckWritable();
+    const std::uint64_t nReserve = GetReserve();
+    std::vector<Extent> oPlaces;
+    std::vector<support::CopiedPiece> oPieces;
+    oPlaces.reserve(oStriles.size());
+    try
+    {
+        for (const CodedStrile& oStrile : oStriles)
+        {
+            oPlaces.push_back(mpoSpace->Allocate(oStrile.mnBytes, nReserve));
+            oPieces.push_back({oStrile.mnOffset, oPlaces.back().mnOffset, oStrile.mnBytes});
+        }
+        support::CopyPieces(oSource, *GetFile(), std::move(oPieces), moScratch);
+    }
+    catch (...)
+    {
+        for (const Extent& oPlace : oPlaces)
+            mpoSpace->Release(oPlace);
+        throw;
+    }
+    for (std::size_t n = 0; n < oStriles.size(); ++n)
+    {
+        const std::uint64_t nStrile = oStriles[n].mnNumber;
+        const Extent oOld{oPage.moOffsets[nStrile], oPage.moRoom[nStrile], oPage.moGenerations[nStrile]};
+        MoveStrile(oPage, nStrile, oOld, oPlaces[n], oStriles[n].mnBytes);
+    }
 }
 
 void FileEditor::MoveStrile(PageModel& oPage, std::uint64_t nStrile, const Extent& oOld, const Extent& oNew,

@@ -2,6 +2,7 @@
 
 #include "plugins/support/file/file.h"
 #include "plugins/support/file/roomrecord.h"
+#include "plugins/support/file/scratch.h"
 #include "plugins/support/file/space.h"
 #include "plugins/support/writing/filewriter.h"
 #include "plugins/tif/reading/page.h"
@@ -17,6 +18,14 @@ namespace krv::plugins::tif
 {
 
 class PageWriter;
+
+// A strip or tile by its number, and where a file has its bytes.
+struct CodedStrile
+{
+    std::uint64_t mnNumber = 0;
+    std::uint64_t mnOffset = 0;
+    std::uint64_t mnBytes = 0;
+};
 
 // A TIFF file that is being written. Its structure is kept here, in memory; blocks and directories are only ever added
 // to the file, beside what its committed state uses. Synchronize writes the new directories and makes them the file's
@@ -66,6 +75,8 @@ public:
 
     // Stores the bytes of a strip or tile: in the place of the old ones when the committed state does not use that.
     void StoreStrile(PageModel& oPage, std::uint64_t nStrile, const unsigned char* pBytes, std::size_t nBytes);
+    // The same of several, from another file and each in a new place: all of them, or none when it throws.
+    void CopyStriles(PageModel& oPage, const support::File& oSource, const std::vector<CodedStrile>& oStriles);
     // Gives an uncompressed strip or tile a place of its own, with what it held, so that rows may be written into it.
     std::uint64_t OwnStrile(PageModel& oPage, std::uint64_t nStrile, std::size_t nBytes);
 
@@ -141,6 +152,7 @@ private:
     bool mbMarked = false;                   // it says that the file was changed
     std::uint64_t mnCommittedSize = 0;       // of the file with all that its committed state may use
     std::vector<Extent> moReleased;          // of pages that are gone
+    support::Scratch moScratch;              // for bytes on their way
     support::RoomRecord moRecord;            // that goes with the next state
     bool mbChanged = false;                  // pages came or went
     bool mbBelowFirst = false;               // the first page listed others when the file was opened

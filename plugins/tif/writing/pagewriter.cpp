@@ -1,10 +1,12 @@
 #include "plugins/tif/writing/pagewriter.h"
 
+#include "plugins/support/codec/bits.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/raster/interleave.h"
 
 #include <algorithm>
 #include <utility>
+#include <vector>
 
 namespace krv::plugins::tif
 {
@@ -27,6 +29,38 @@ std::size_t ChooseBound(const PageForm& oForm, std::size_t nPixelBytes)
                    MOST_HELD_BYTES));
 }
 
+// As the encoder makes samples narrow and the reader wide again.
+support::HeldBlocks::SettlePixels MakeSettling(const SampleForm& oSample, PixelUse eUse)
+{
+    if (eUse == PixelUse::eBitmap)
+        return &support::HeldBlocks::SettleBits;
+    const auto Reals = [](auto* pNarrow, auto* pWiden, std::size_t nNarrowBytes)
+    {
+        return [=](unsigned char* pPixels, std::size_t nBytes)
+        {
+            const std::size_t nCount = nBytes / sizeof(float);
+            std::vector<unsigned char> oNarrow(nCount * nNarrowBytes);
+            pNarrow(pPixels, oNarrow.data(), nCount);
+            pWiden(oNarrow.data(), pPixels, nCount);
+        };
+    };
+    switch (oSample.meWidening)
+    {
+    case Widening::eNone:
+        return nullptr;
+    case Widening::eHalf:
+        return Reals(&codec::FloatToHalf, &codec::HalfToFloat, 2);
+    case Widening::eFloat24:
+        return Reals(&codec::FloatToFloat24, &codec::Float24ToFloat, 3);
+    default:
+        return [oSample](unsigned char* pPixels, std::size_t nBytes)
+        {
+            const std::size_t nValueBytes = oSample.GetValueBytes();
+            codec::FitBits(pPixels, nBytes / nValueBytes, nValueBytes, oSample.GetBits(), oSample.IsSigned());
+        };
+    }
+}
+
 } // namespace
 
 PageWriter::PageWriter(std::shared_ptr<FileEditor> poEditor, std::shared_ptr<PageModel> poModel,
@@ -37,7 +71,7 @@ PageWriter::PageWriter(std::shared_ptr<FileEditor> poEditor, std::shared_ptr<Pag
           ChooseBound(moForm, GetPixelBytes()), GetPixelBytes(),
           [this](const support::HeldBlocks::Block& oBlock, const unsigned char* pPixels)
           { Store(oBlock, pPixels, oBlock.moRect.mnWidth * GetPixelBytes()); },
-          eUse == PixelUse::eBitmap ? support::HeldBlocks::Samples::eBits : support::HeldBlocks::Samples::eValues)
+          MakeSettling(moForm.moSample, eUse))
 {
 }
 
@@ -179,6 +213,16 @@ void PageWriter::StoreCoded(std::uint64_t nStrile, const unsigned char* pBytes, 
     NoteChange();
     mpoEditor->StoreStrile(*mpoModel, nStrile, pBytes, nBytes);
     moHeld.Forget(nStrile);
+    moReader.Forget();
+}
+
+void PageWriter::CopyCoded(const support::File& oSource, const std::vector<CodedStrile>& oStriles)
+{
+    CheckPage();
+    NoteChange();
+    mpoEditor->CopyStriles(*mpoModel, oSource, oStriles);
+    for (const CodedStrile& oStrile : oStriles)
+        moHeld.Forget(oStrile.mnNumber);
     moReader.Forget();
 }
 

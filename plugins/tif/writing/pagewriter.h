@@ -37,6 +37,8 @@ public:
                     std::size_t nPitch) override;
     // Takes the bytes of a strip or tile as they are.
     void StoreCoded(std::uint64_t nStrile, const unsigned char* pBytes, std::size_t nBytes);
+    // The same of several, as another file has them.
+    void CopyCoded(const support::File& oSource, const std::vector<CodedStrile>& oStriles);
     bool Holds() const { return !moHeld.IsEmpty(); }
     // Stores what is held back, as long as the page is there.
     void Flush();

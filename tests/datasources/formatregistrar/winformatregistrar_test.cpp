@@ -37,10 +37,9 @@ std::string LoadError()
     {
         DatasetManager::GetInstance();
     }
-    catch (const std::exception& oException) // for everybody, whether they know the XML library or not
+    catch (const krv::xml::ParseError& oError) // for everybody, whether they know the XML library or not
     {
-        error = krv::xml::IsParseException(oException) ? std::string("xml: ") + oException.what()
-                                                       : krv::test::DescribeException();
+        error = std::string("xml: ") + oError.what();
     }
     catch (...)
     {

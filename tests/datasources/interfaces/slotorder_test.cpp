@@ -1,5 +1,6 @@
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/iblockencoding.h"
+#include "datasources/interfaces/iblocktransfer.h"
 #include "datasources/interfaces/ichannelfilter.h"
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
@@ -11,6 +12,7 @@
 #include "datasources/interfaces/ihistoryio.h"
 #include "datasources/interfaces/ilayoutdataset.h"
 #include "datasources/interfaces/ilinkeddataset.h"
+#include "datasources/interfaces/ilutdataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/interfaces/ioverviewio.h"
@@ -21,6 +23,7 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/interfaces/istoragedataset.h"
+#include "datasources/interfaces/iverifieddataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/reader/irasteriterable.h"
@@ -74,6 +77,7 @@ std::vector<Table> Tables()
     using OM = IOverviewManager;
     using BM = IBitmapDataset;
     using PC = IPCTDataset;
+    using LU = ILUTDataset;
     using MM = IMathModelDataset;
     using EP = IEphemerisDataset;
     using RI = IRasterIterable;
@@ -118,6 +122,10 @@ std::vector<Table> Tables()
         {"IPCTDataset",
          {Slot(&PC::GetPCTList), Slot(&PC::GetPCT), Slot(&PC::GetPCTChannel), Slot(&PC::GetPCTDescription),
           Slot(&PC::CreatePCT), Slot(&PC::UpdatePCT), Slot(&PC::SetPCTDescription), Slot(&PC::DeletePCT)}},
+        {"ILUTDataset",
+         {Slot(&LU::GetLUTList), Slot(&LU::GetLUT), Slot(&LU::GetLUTChannel), Slot(&LU::GetLUTDescription),
+          Slot(&LU::CreateLUT), Slot(&LU::UpdateLUT), Slot(&LU::SetLUTDescription), Slot(&LU::DeleteLUT)}},
+        {"IVerifiedDataset", {Slot(&IVerifiedDataset::Verify)}},
         {"INewFileDataset", {Slot(&INewFileDataset::KeepExisting)}},
         {"IStorageDataset", {Slot(&IStorageDataset::GetUnusedBytes)}},
         {"ILayoutDataset", {Slot(&ILayoutDataset::GetVariant), Slot(&ILayoutDataset::CheckCloudLayout)}},
@@ -128,6 +136,7 @@ std::vector<Table> Tables()
           Slot(&IEncodedBlocks::SetEncodedForm), Slot(&IEncodedBlocks::StoreEncoded)}},
         {"IBlockEncoder", {Slot(&IBlockEncoder::Encode)}},
         {"IBlockEncoding", {Slot(&IBlockEncoding::MakeBlockEncoder)}},
+        {"IBlockTransfer", {Slot(&IBlockTransfer::TakeBlocks)}},
         {"IHistoryIO",
          {Slot(&IHistoryIO::ReadHistory), Slot(&IHistoryIO::AppendHistory), Slot(&IHistoryIO::ClearHistory)}},
         {"IMathModelDataset",

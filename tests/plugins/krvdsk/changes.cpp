@@ -6,7 +6,7 @@
 #include "gobs/pct/pct.h"
 #include "gobs/raster/rasterinfo.h"
 #include "plugins/krvdsk/krvdskbuilder.h"
-#include "plugins/support/codec/checksum.h"
+#include "tests/support/telldataset.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/ogc/cs/crsfactory.h"
 
@@ -34,22 +34,6 @@ DataType TypeOf(KrvdskDataset& oDataset, unsigned int nChannel)
     return poInfo->GetDataType();
 }
 
-std::string Sum(IRasterIO* poIO, std::size_t nPixelBytes)
-{
-    const IOPointer oIO(poIO);
-    std::vector<unsigned char> oPixels(std::size_t{oIO->GetFileWidth()} * oIO->GetFileHeight() * nPixelBytes);
-    oIO->ReadWindow(0U, 0U, oIO->GetFileWidth(), oIO->GetFileHeight(), oPixels.data());
-    return std::to_string(krv::plugins::codec::Checksum(0, oPixels.data(), oPixels.size())) + " ";
-}
-
-std::string Text(const krv::datasources::MetadataMap& oMap)
-{
-    std::string text;
-    for (const auto& [key, value] : oMap)
-        text += key + "=" + value + "\n";
-    return text;
-}
-
 void WriteNoise(IRasterIO* poIO, std::size_t nPixelBytes, std::mt19937& oRandom, bool bTile)
 {
     const IOPointer oIO(poIO);
@@ -68,53 +52,6 @@ void WriteNoise(IRasterIO* poIO, std::size_t nPixelBytes, std::mt19937& oRandom,
     for (std::size_t nAt = 0; nAt < oPixels.size(); ++nAt)
         oPixels[nAt] = static_cast<unsigned char>((nSeed >> nAt % 24) + nAt / 5 * nSeed);
     oIO->WriteWindow(nX, nY, nColumns, nRows, oPixels.data());
-}
-
-std::string TellAll(KrvdskDataset& oDataset)
-{
-    std::string text = std::to_string(oDataset.GetWidth()) + " x " + std::to_string(oDataset.GetHeight()) + "\n";
-    const unsigned int nChannels = oDataset.GetChanCount();
-    const AuxiliaryData oRecord = oDataset.ReadAuxiliaryData();
-    text += Text(oRecord.GetFileMetadata());
-    const ManagerPointer poLevels(oDataset.GetOverviewManager());
-    for (unsigned int nChannel = 1; nChannel <= nChannels; ++nChannel)
-    {
-        const DataType oType = TypeOf(oDataset, nChannel);
-        const std::size_t nBytes = oType.GetValueBits() / 8;
-        text += oType.Describe() + " " + oRecord.GetChannelDescription(nChannel) + "\n" +
-                Text(oRecord.GetChanMetadata(nChannel)) + Sum(oDataset.GetRasterIO({nChannel}), nBytes);
-        for (const unsigned int nLevel : poLevels->GetLevels())
-            text += std::to_string(nLevel) + (poLevels->IsValid(nChannel, nLevel) ? " valid " : " invalid ") +
-                    Sum(poLevels->GetOverviewIO(nLevel, {nChannel}), nBytes);
-        for (const std::string& entry : oDataset.GetHistoryIO(nChannel)->ReadHistory())
-            text += entry + "\n";
-    }
-    const ManagerPointer poBitmapLevels(oDataset.GetBitmapOverviewManager());
-    for (const unsigned int nBitmap : oDataset.GetBitmapList())
-    {
-        text += "bitmap " + std::to_string(nBitmap) + oDataset.GetBitmapDescription(nBitmap) +
-                Text(oDataset.GetBitmapMetadata(nBitmap)) + Sum(oDataset.GetBitmapIO({nBitmap}), 1);
-        for (const unsigned int nLevel : poBitmapLevels->GetLevels())
-            text += Sum(poBitmapLevels->GetOverviewIO(nLevel, {nBitmap}), 1);
-    }
-    for (const unsigned int nTable : oDataset.GetPCTList())
-    {
-        const std::unique_ptr<krv::gobs::PCT> poTable(oDataset.GetPCT(nTable));
-        text += "PCT " + std::to_string(nTable) + " of " + std::to_string(oDataset.GetPCTChannel(nTable)) +
-                oDataset.GetPCTDescription(nTable);
-        for (const krv::gobs::PCT::Entry& oEntry : poTable->GetEntries())
-            text += std::to_string(oEntry.low) + " " + std::to_string(oEntry.colour.green) + " ";
-    }
-    for (const unsigned int nTable : oDataset.GetLUTList())
-    {
-        text += "LUT " + std::to_string(nTable) + oDataset.GetLUTDescription(nTable);
-        for (const krv::datasources::LookupEntry& oEntry : oDataset.GetLUT(nTable))
-            text += std::to_string(oEntry.value) + " " + std::to_string(oEntry.result) + " ";
-    }
-    for (const double nTerm : oDataset.GetGeocoding().GetTerms())
-        text += std::to_string(nTerm) + " ";
-    const std::unique_ptr<krv::ogc::cs::ICRS> poCRS(oDataset.ReadCRS());
-    return text + (poCRS ? poCRS->GetName() : "no system");
 }
 
 } // namespace
@@ -142,7 +79,7 @@ std::string Tell(KrvdskDataset& oDataset)
 {
     try
     {
-        return TellAll(oDataset);
+        return TellDataset(oDataset);
     }
     catch (const krv::Exception& oException)
     {

@@ -2,13 +2,13 @@
 #include "datasources/interfaces/irasterio.h"
 #include "tests/plugins/krvdsk/changes.h"
 #include "tests/plugins/krvdsk/disk.h"
+#include "tests/soak/soakrun.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <gtest/gtest.h>
 
 #include <chrono>
 #include <csignal>
-#include <cstdlib>
 #include <filesystem>
 #include <iostream>
 #include <set>
@@ -29,12 +29,6 @@ using namespace krv::gobs;
 const Types MIXED = {eDT_8U, eDT_8U, eDT_8U, eDT_32R, eDT_C16S};
 constexpr const char* KINDS[] = {"BLOCKXSIZE=32 BLOCKYSIZE=16", "BLOCKXSIZE=40 BLOCKYSIZE=30 COMPRESS=ZSTD LEVEL=1",
                                  "BLOCKXSIZE=64 BLOCKYSIZE=64 COMPRESS=LZ4 INTERLEAVE=BAND"};
-
-unsigned int FromEnvironment(const char* pName, unsigned int nDefault)
-{
-    const char* const pText = std::getenv(pName);
-    return pText != nullptr ? static_cast<unsigned int>(std::strtoul(pText, nullptr, 10)) : nDefault;
-}
 
 // A state that was synchronised, and between which calls to the system that happened.
 struct Commit

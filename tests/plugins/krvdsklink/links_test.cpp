@@ -1,6 +1,7 @@
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/iencodedblocks.h"
 #include "datasources/interfaces/iephemerisdataset.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ilinkeddataset.h"
@@ -9,13 +10,17 @@
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
+#include "datasources/interfaces/iverifieddataset.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
+#include "datasources/overviews/overviewbuilder.h"
 #include "datasources/utils/createlinkedpix.h"
 #include "datasources/utils/loadmathmodel.h"
+#include "datasources/writer/basicwriter.h"
 #include "gobs/pct/pct.h"
 #include "gobs/raster/rasterinfo.h"
 #include "tests/support/facts.h"
+#include "tests/support/telldataset.h"
 #include "tests/support/thrown.h"
 #include "toolkit/mathmodel/rpcmodel.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
@@ -343,9 +348,67 @@ TEST_F(LinkTest, LevelsAreThoseOfBoth)
     const Bytes oBoth = ReadAll(*poBoth, 2);
     EXPECT_EQ(oBoth[0], 55);
     EXPECT_EQ(oBoth[1], 77);
-    EXPECT_NE(Error([&] { poLevels->SetValid(1, 4, false); }), "");
     EXPECT_EQ(poLevels->GetAuxiliaryData(4).GetChannelCount(), 2U);
+    // What the link is to say of it is said here, with the pixels that it had.
+    poLevels->SetValid(1, 4, false);
+    EXPECT_FALSE(poLevels->IsValid(1, 4));
+    EXPECT_EQ(ReadAll(*IOPtr(poLevels->GetOverviewIO(4, {1})), 1), Bytes(std::size_t{75} * 70, 77));
+    poLevels->DeleteLevel(4);
+    EXPECT_TRUE(poLevels->IsValid(1, 4));
+    EXPECT_NE(Error([&] { poLevels->DeleteLevel(4); }).find("lies in " + source), std::string::npos);
     poLink->Close();
+}
+
+// As those of the source itself would be, which is not touched; they are there when it is gone.
+TEST_F(LinkTest, OverviewsOfALinkedFileAreItsOwn)
+{
+    const std::string source = Make("scene.tif", "TIF", 301, 277, 2), link = File("scene.krv");
+    const auto Build = [](IDataset& oDataset)
+    {
+        BasicWriter oWriter(&As<IRasterDataset>(oDataset), {1, 2});
+        EXPECT_TRUE(BuildOverviews(oWriter, {2, 4}, "average"));
+        oDataset.Close();
+    };
+    {
+        const DatasetPtr poSource = Open(source, eUpdate);
+        Bytes oRandom(std::size_t{301} * 277 * 2), oBits(std::size_t{301} * 277);
+        for (std::size_t n = 0; n < oRandom.size(); ++n)
+            oRandom[n] = static_cast<unsigned char>(n * n / 7);
+        for (std::size_t n = 0; n < oBits.size(); ++n)
+            oBits[n] = n % 301 < 200;
+        IOPtr(As<IRasterDataset>(*poSource).GetRasterIO({1, 2}))->WriteWindow(0U, 0U, 301U, 277U, oRandom.data());
+        auto& oBitmaps = As<IBitmapDataset>(*poSource);
+        const unsigned int nMask = oBitmaps.CreateBitmap();
+        oBitmaps.SetBitmapDescription(nMask, ""); // of valid pixels
+        IOPtr(oBitmaps.GetBitmapIO({nMask}))->WriteWindow(0U, 0U, 301U, 277U, oBits.data());
+        // One level is there already, of another method and a side that was rounded down.
+        const std::unique_ptr<IOverviewManager> poLevels(As<IRasterDataset>(*poSource).GetOverviewManager());
+        poLevels->CreateLevel(4);
+        EncodedForm oForm = As<IEncodedBlocks>(*poSource).GetEncodedForm(4);
+        oForm.mnWidth = 75;
+        ASSERT_TRUE(As<IEncodedBlocks>(*poSource).SetEncodedForm(4, oForm));
+        for (const unsigned int nChannel : {1U, 2U})
+            poLevels->SetValid(nChannel, 4, true);
+        poSource->Close();
+    }
+    const std::string bytes = krv::conformance::ReadFile(source);
+    Link(link, source);
+    Build(*Open(link, eUpdate));
+    EXPECT_EQ(krv::conformance::ReadFile(source), bytes);
+    krv::conformance::WriteFile(File("copy.tif"), bytes);
+    Build(*Open(File("copy.tif"), eUpdate));
+    const DatasetPtr poLink = Open(link), poCopy = Open(File("copy.tif"));
+    EXPECT_EQ(TellDataset(*poLink), TellDataset(*poCopy));
+    std::filesystem::remove(source);
+    const DatasetPtr poLeft = Open(link);
+    ExpectSameLevels(As<IRasterDataset>(*poCopy).GetOverviewManager(), As<IRasterDataset>(*poLeft).GetOverviewManager(),
+                     {1, 2}, 1);
+    EXPECT_TRUE(As<IVerifiedDataset>(*poLeft).Verify({}).empty());
+    // And they go with their channel.
+    const DatasetPtr poFewer = Open(link, eUpdate);
+    As<IRasterDataset>(*poFewer).DeleteChannel(1);
+    poFewer->Close();
+    EXPECT_TRUE(std::unique_ptr<IOverviewManager>(As<IRasterDataset>(*Open(link)).GetOverviewManager())->IsValid(1, 2));
 }
 
 TEST_F(LinkTest, SegmentsOfTheSourceKeepTheirNumbers)

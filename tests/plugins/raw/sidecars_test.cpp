@@ -18,6 +18,7 @@
 #include "tests/support/pixels.h"
 #include "tests/support/recipe.h"
 #include "tests/support/thrown.h"
+#include "toolkit/ogc/cs/crsfactory.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 #include "toolkit/ogc/cs/icrs.h"
 #include "tools/conformance/tempfolder.h"
@@ -124,7 +125,7 @@ TEST(AuxXmlFiles, AreMerged)
 
 TEST(Sidecars, AddWhatTheFileLacks)
 {
-    for (const char* pFormat : {"TIF", "RAW"})
+    for (const char* pFormat : {"TIF", "RAW", "JP2", "DEMO"})
     {
         SCOPED_TRACE(pFormat);
         const TempFolder oFolder;
@@ -233,6 +234,62 @@ TEST(Generic, LevelsLieBesideWhatCannotHoldThem)
             EXPECT_TRUE(krv::test::ReadPixels(*poOne) == krv::test::ReadPixels(*poOther)) << nLevel;
         }
     }
+}
+
+// A format that updates no files: what they lack is kept beside them, and what they say themselves is refused.
+TEST(Generic, WhatAFileLacksIsKeptBesideIt)
+{
+    for (const auto& [pFormat, pName] : {std::pair{"JP2", "x.j2k"}, {"DEMO", "x.img"}})
+    {
+        SCOPED_TRACE(pFormat);
+        const TempFolder oFolder;
+        const std::string file = Make(oFolder, pName, pFormat), before = ReadFile(file);
+        EXPECT_NE(krv::test::Error([&] { Open(file, eUpdate); }), "");
+        const auto Update = [&]
+        {
+            return std::unique_ptr<IDataset>(DatasetManager::GetInstance()->OpenFormat("GDBALL", file, eUpdate));
+        };
+        const krv::ogc::cs::GeocodingInfo oPlace(10, 2, 0, 20, 0, -2);
+        {
+            const auto poDataset = Update();
+            AuxiliaryData oTags = poDataset->ReadAuxiliaryData();
+            oTags.SetFileMetadataValue("scene", "alps");
+            oTags.SetChanMetadataValue("NO_DATA_VALUE", "7", 1);
+            poDataset->WriteAuxiliaryData(oTags);
+            poDataset->UpdateCRS(*std::unique_ptr<krv::ogc::cs::ICRS>(krv::ogc::cs::CreateCRSFromEPSG(32633)));
+            dynamic_cast<IGeocodedDataset&>(*poDataset).SetGeocoding(oPlace);
+            auto& oBitmaps = dynamic_cast<IBitmapDataset&>(*poDataset);
+            const unsigned int nMask = oBitmaps.CreateBitmap();
+            oBitmaps.SetBitmapDescription(nMask, "");
+            unsigned char nBit = 9;
+            std::unique_ptr<IRasterIO>(oBitmaps.GetBitmapIO({nMask}))->WriteWindow(3u, 2u, 1u, 1u, &nBit);
+            EXPECT_EQ(poDataset->ReadAuxiliaryData().GetFileMetadataValue("scene"), "alps");
+            EXPECT_FALSE(std::filesystem::exists(file + ".aux.xml"));
+            poDataset->Close();
+        }
+        EXPECT_EQ(ReadFile(file), before);
+        const auto poDataset = Open(file);
+        EXPECT_EQ(poDataset->ReadAuxiliaryData().GetFileMetadataValue("scene"), "alps");
+        EXPECT_EQ(poDataset->ReadAuxiliaryData().GetChanMetadataValue("NO_DATA_VALUE", 1), "7");
+        EXPECT_EQ(std::unique_ptr<krv::ogc::cs::ICRS>(poDataset->ReadCRS())->GetEPSG(), 32633);
+        EXPECT_TRUE(dynamic_cast<IGeocodedDataset&>(*poDataset).GetGeocoding() == oPlace);
+        EXPECT_EQ(ReadMask(*poDataset, 1).substr(2 * 60 + 2, 3), std::string("\0\1\0", 3));
+    }
+    const TempFolder oFolder;
+    const std::string file = oFolder.File("x.img");
+    {
+        const std::unique_ptr<IDataset> poNew(DatasetManager::GetInstance()->NewDataset(file, "DEMO", ""));
+        Rasters(*poNew).Create(9, 9, {krv::gobs::eDT_8U});
+        AuxiliaryData oTags(1);
+        oTags.SetFileMetadataValue("scene", "sea");
+        poNew->WriteAuxiliaryData(oTags);
+        poNew->Close();
+    }
+    const std::unique_ptr<IDataset> poUpdate(DatasetManager::GetInstance()->OpenFormat("GDBALL", file, eUpdate));
+    AuxiliaryData oTags = poUpdate->ReadAuxiliaryData();
+    oTags.SetFileMetadataValue("scene", "alps");
+    EXPECT_NE(krv::test::Error([&] { poUpdate->WriteAuxiliaryData(oTags); }).find("the file itself says it"),
+              std::string::npos);
 }
 
 TEST(Generic, LevelsOfAnotherSceneAreNotUsed)

@@ -23,8 +23,8 @@ std::size_t CoordinateTransformation::Parts::Run(PJ_DIRECTION eDirection, std::s
 {
     constexpr std::size_t STRIDE = sizeof(double);
     constexpr double INFINITE = std::numeric_limits<double>::infinity();
-    proj_trans_generic(mpoOperation.get(), eDirection, poX, STRIDE, nCount, poY, STRIDE, nCount, poZ, STRIDE,
-                       poZ == nullptr ? 0 : nCount, nullptr, 0, 0);
+    detail::Proj().proj_trans_generic(mpoOperation.get(), eDirection, poX, STRIDE, nCount, poY, STRIDE, nCount, poZ,
+                                      STRIDE, poZ == nullptr ? 0 : nCount, nullptr, 0, 0);
     std::size_t nGood = 0;
     for (std::size_t nAt = 0; nAt < nCount; ++nAt)
     {
@@ -46,10 +46,10 @@ CoordinateTransformation::CoordinateTransformation(const ICRS& oSource, const IC
     const detail::ProjContext& oContext = mpoParts->moContext;
     const detail::ProjObject poSource = detail::MakeObject(oContext, oSource, oPlace);
     const detail::ProjObject poTarget = detail::MakeObject(oContext, oTarget, oPlace);
-    const detail::ProjObject poRaw(
-        proj_create_crs_to_crs_from_pj(oContext.Get(), poSource.get(), poTarget.get(), nullptr, nullptr));
+    const detail::ProjObject poRaw(detail::Proj().proj_create_crs_to_crs_from_pj(oContext.Get(), poSource.get(),
+                                                                                 poTarget.get(), nullptr, nullptr));
     if (poRaw)
-        mpoParts->mpoOperation.reset(proj_normalize_for_visualization(oContext.Get(), poRaw.get()));
+        mpoParts->mpoOperation.reset(detail::Proj().proj_normalize_for_visualization(oContext.Get(), poRaw.get()));
     if (!mpoParts->mpoOperation)
         oContext.Fail("No transformation from \"" + oSource.GetName() + "\" to \"" + oTarget.GetName() + "\"", oPlace);
 }

@@ -82,14 +82,14 @@ bool IsCodeText(std::string_view text, std::string& authority, std::string& code
 ProjObject FindPart(const ProjContext& oContext, PJ_CATEGORY eCategory, int nCode)
 {
     const std::string code = std::to_string(nCode);
-    return ProjObject(proj_create_from_database(oContext.Get(), "EPSG", code.c_str(), eCategory, 0, nullptr));
+    return ProjObject(Proj().proj_create_from_database(oContext.Get(), "EPSG", code.c_str(), eCategory, 0, nullptr));
 }
 
 ProjObject FindCRS(const ProjContext& oContext, const std::string& authority, const std::string& code,
                    const Place& oPlace)
 {
     ProjObject poObject(
-        proj_create_from_database(oContext.Get(), authority.c_str(), code.c_str(), PJ_CATEGORY_CRS, 0, nullptr));
+        Proj().proj_create_from_database(oContext.Get(), authority.c_str(), code.c_str(), PJ_CATEGORY_CRS, 0, nullptr));
     if (!poObject)
         oContext.Fail(authority + ":" + code + " is no known reference system", oPlace);
     return poObject;
@@ -98,7 +98,7 @@ ProjObject FindCRS(const ProjContext& oContext, const std::string& authority, co
 ProjObject ParseWKT(const ProjContext& oContext, const std::string& text)
 {
     const char* const OPTIONS[] = {"STRICT=NO", nullptr};
-    return ProjObject(proj_create_from_wkt(oContext.Get(), text.c_str(), OPTIONS, nullptr, nullptr));
+    return ProjObject(Proj().proj_create_from_wkt(oContext.Get(), text.c_str(), OPTIONS, nullptr, nullptr));
 }
 
 PJ_CATEGORY CategoryOf(eEPSGPart ePart)
@@ -135,10 +135,10 @@ ProjObject ParseDefinition(const ProjContext& oContext, const std::string& defin
     if (IsCodeText(text, authority, code))
         return FindCRS(oContext, authority, code, oPlace);
     ProjObject poObject =
-        text.front() == '{' ? ProjObject(proj_create(oContext.Get(), text.c_str())) : ParseWKT(oContext, text);
+        text.front() == '{' ? ProjObject(Proj().proj_create(oContext.Get(), text.c_str())) : ParseWKT(oContext, text);
     if (!poObject)
         oContext.Fail(what, oPlace);
-    if (proj_is_crs(poObject.get()) == 0)
+    if (detail::Proj().proj_is_crs(poObject.get()) == 0)
         throw DataException(what + ": it does not define a reference system", oPlace);
     return poObject;
 }
@@ -164,7 +164,7 @@ std::string DescribeEPSGPart(eEPSGPart ePart, int nCode, const Place& oPlace)
     const detail::ProjContext oContext;
     const detail::ProjObject poObject = detail::FindPart(oContext, detail::CategoryOf(ePart), nCode);
     const char* const OPTIONS[] = {"MULTILINE=NO", "SCHEMA=", nullptr};
-    const char* poText = poObject ? proj_as_projjson(oContext.Get(), poObject.get(), OPTIONS) : nullptr;
+    const char* poText = poObject ? detail::Proj().proj_as_projjson(oContext.Get(), poObject.get(), OPTIONS) : nullptr;
     if (poText == nullptr)
         oContext.Fail("EPSG:" + std::to_string(nCode) + " is not known", oPlace);
     return poText;
@@ -176,8 +176,8 @@ EPSGUnit FindEPSGUnit(int nCode, const Place& oPlace)
     EPSGUnit oUnit;
     const char* poName = nullptr;
     const char* poCategory = nullptr;
-    if (proj_uom_get_info_from_database(oContext.Get(), "EPSG", std::to_string(nCode).c_str(), &poName, &oUnit.factor,
-                                        &poCategory) == 0)
+    if (detail::Proj().proj_uom_get_info_from_database(oContext.Get(), "EPSG", std::to_string(nCode).c_str(), &poName,
+                                                       &oUnit.factor, &poCategory) == 0)
         oContext.Fail("The unit EPSG:" + std::to_string(nCode) + " is not known", oPlace);
     oUnit.name = poName;
     oUnit.isAngular = std::string_view(poCategory) == "angular";

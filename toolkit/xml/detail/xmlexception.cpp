@@ -5,21 +5,27 @@
 namespace krv::xml::detail
 {
 
-ParseException::ParseException(const xercesc::SAXParseException& oException)
-    : SAXParseException(oException), moDescription(XmlTranscode(oException.getSystemId()))
+namespace
 {
-    if (getLineNumber() > 0)
-        moDescription += ":" + std::to_string(getLineNumber()) + ":" + std::to_string(getColumnNumber());
-    moDescription += (moDescription.empty() ? "" : ": ") + XmlTranscode(getMessage());
+
+std::string Describe(const xercesc::SAXParseException& oException)
+{
+    std::string description = XmlTranscode(oException.getSystemId());
+    if (oException.getLineNumber() > 0)
+        description +=
+            ":" + std::to_string(oException.getLineNumber()) + ":" + std::to_string(oException.getColumnNumber());
+    return description + (description.empty() ? "" : ": ") + XmlTranscode(oException.getMessage());
+}
+
+} // namespace
+
+ParseException::ParseException(const xercesc::SAXParseException& oException)
+    : SAXParseException(oException), ParseError(Describe(oException))
+{
 }
 
 ParseException::ParseException(const ParseException&) = default;
 ParseException& ParseException::operator=(const ParseException&) = default;
 ParseException::~ParseException() = default;
-
-const char* ParseException::what() const noexcept
-{
-    return moDescription.c_str();
-}
 
 } // namespace krv::xml::detail

@@ -20,18 +20,18 @@ std::string_view WithoutFunction(std::string_view message)
 
 } // namespace
 
-ProjContext::ProjContext() : mpoContext(proj_context_create())
+ProjContext::ProjContext() : mpoContext(Proj().proj_context_create())
 {
     if (mpoContext == nullptr)
         throw std::bad_alloc();
-    proj_log_func(mpoContext, this, &ProjContext::Log);
-    proj_log_level(mpoContext, PJ_LOG_ERROR);
-    proj_context_set_enable_network(mpoContext, 0);
+    Proj().proj_log_func(mpoContext, this, &ProjContext::Log);
+    Proj().proj_log_level(mpoContext, PJ_LOG_ERROR);
+    Proj().proj_context_set_enable_network(mpoContext, 0);
 }
 
 ProjContext::~ProjContext()
 {
-    proj_context_destroy(mpoContext);
+    Proj().proj_context_destroy(mpoContext);
 }
 
 void ProjContext::Log(void* poSelf, int, const char* poMessage)
@@ -48,7 +48,7 @@ void ProjContext::Fail(const std::string& what, const Place& oPlace) const
 {
     std::string message = std::move(moMessage);
     moMessage.clear();
-    if (proj_context_get_database_path(mpoContext) == nullptr)
+    if (Proj().proj_context_get_database_path(mpoContext) == nullptr)
         message = "the reference system database proj.db cannot be found; install it (Debian package proj-data) or let "
                   "PROJ_LIB name its folder";
     throw DataException(what + ": " + (message.empty() ? "no further cause is known" : message), oPlace);

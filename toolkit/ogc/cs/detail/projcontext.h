@@ -1,8 +1,7 @@
 #pragma once
 
 #include "toolkit/exceptions/place.h"
-
-#include <proj.h>
+#include "toolkit/ogc/cs/detail/projlibrary.h"
 
 #include <memory>
 #include <string>
@@ -12,7 +11,7 @@ namespace krv::ogc::cs::detail
 
 struct ProjDelete
 {
-    void operator()(PJ* poObject) const { proj_destroy(poObject); }
+    void operator()(PJ* poObject) const { Proj().proj_destroy(poObject); }
 };
 
 using ProjObject = std::unique_ptr<PJ, ProjDelete>;

@@ -24,10 +24,10 @@ bool IsGeographicType(PJ_TYPE eType)
 
 int FindEPSGCode(const PJ* poObject)
 {
-    for (int nAt = 0; proj_get_id_auth_name(poObject, nAt) != nullptr; ++nAt)
+    for (int nAt = 0; Proj().proj_get_id_auth_name(poObject, nAt) != nullptr; ++nAt)
     {
-        const std::optional<int> oCode = ParseNumber<int>(Text(proj_get_id_code(poObject, nAt)));
-        if (oCode && std::string_view(proj_get_id_auth_name(poObject, nAt)) == "EPSG")
+        const std::optional<int> oCode = ParseNumber<int>(Text(Proj().proj_get_id_code(poObject, nAt)));
+        if (oCode && std::string_view(Proj().proj_get_id_auth_name(poObject, nAt)) == "EPSG")
             return *oCode;
     }
     return 0;
@@ -60,7 +60,7 @@ ICRS* ProjCRS::Clone() const
 
 std::string ProjCRS::GetName() const
 {
-    const std::string name = Text(proj_get_name(mpoObject.get()));
+    const std::string name = Text(Proj().proj_get_name(mpoObject.get()));
     return name.empty() ? "unknown" : name;
 }
 
@@ -83,7 +83,7 @@ std::string ProjCRS::GetWKT1() const
 std::string ProjCRS::GetPROJJSON() const
 {
     const char* const OPTIONS[] = {"MULTILINE=NO", nullptr};
-    const char* poText = proj_as_projjson(mpoContext->Get(), mpoObject.get(), OPTIONS);
+    const char* poText = Proj().proj_as_projjson(mpoContext->Get(), mpoObject.get(), OPTIONS);
     if (poText == nullptr)
         mpoContext->Fail("\"" + GetName() + "\" cannot be written as PROJJSON", Place::Current());
     return poText;
@@ -93,32 +93,32 @@ bool ProjCRS::IsEquivalent(const ICRS& oOther) const
 {
     PJ_CONTEXT* poContext = mpoContext->Get();
     const ProjObject poOther = MakeObject(*mpoContext, oOther, Place::Current());
-    const ProjObject poLeft(proj_normalize_for_visualization(poContext, mpoObject.get()));
-    const ProjObject poRight(proj_normalize_for_visualization(poContext, poOther.get()));
-    return proj_is_equivalent_to_with_ctx(poContext, poLeft ? poLeft.get() : mpoObject.get(),
-                                          poRight ? poRight.get() : poOther.get(),
-                                          PJ_COMP_EQUIVALENT_EXCEPT_AXIS_ORDER_GEOGCRS) != 0;
+    const ProjObject poLeft(Proj().proj_normalize_for_visualization(poContext, mpoObject.get()));
+    const ProjObject poRight(Proj().proj_normalize_for_visualization(poContext, poOther.get()));
+    return Proj().proj_is_equivalent_to_with_ctx(poContext, poLeft ? poLeft.get() : mpoObject.get(),
+                                                 poRight ? poRight.get() : poOther.get(),
+                                                 PJ_COMP_EQUIVALENT_EXCEPT_AXIS_ORDER_GEOGCRS) != 0;
 }
 
 bool ProjCRS::IsGeographic() const
 {
-    return IsGeographicType(proj_get_type(Horizontal().get()));
+    return IsGeographicType(Proj().proj_get_type(Horizontal().get()));
 }
 
 bool ProjCRS::IsProjected() const
 {
-    return proj_get_type(Horizontal().get()) == PJ_TYPE_PROJECTED_CRS;
+    return Proj().proj_get_type(Horizontal().get()) == PJ_TYPE_PROJECTED_CRS;
 }
 
 bool ProjCRS::HasVertical() const
 {
     PJ_CONTEXT* poContext = mpoContext->Get();
     const ProjObject poObject = Unbound();
-    const PJ_TYPE eType = proj_get_type(poObject.get());
+    const PJ_TYPE eType = Proj().proj_get_type(poObject.get());
     if (eType == PJ_TYPE_COMPOUND_CRS || eType == PJ_TYPE_VERTICAL_CRS)
         return true;
-    const ProjObject poSystem(proj_crs_get_coordinate_system(poContext, poObject.get()));
-    return poSystem && proj_cs_get_axis_count(poContext, poSystem.get()) == 3;
+    const ProjObject poSystem(Proj().proj_crs_get_coordinate_system(poContext, poObject.get()));
+    return poSystem && Proj().proj_cs_get_axis_count(poContext, poSystem.get()) == 3;
 }
 
 std::string ProjCRS::GetUnitName() const
@@ -135,12 +135,12 @@ std::string ProjCRS::GetDatumName() const
 {
     PJ_CONTEXT* poContext = mpoContext->Get();
     const ProjObject poHorizontal = Horizontal();
-    const ProjObject poGeodetic(proj_crs_get_geodetic_crs(poContext, poHorizontal.get()));
+    const ProjObject poGeodetic(Proj().proj_crs_get_geodetic_crs(poContext, poHorizontal.get()));
     const PJ* poOwner = poGeodetic ? poGeodetic.get() : poHorizontal.get();
-    ProjObject poDatum(proj_crs_get_datum(poContext, poOwner));
+    ProjObject poDatum(Proj().proj_crs_get_datum(poContext, poOwner));
     if (!poDatum)
-        poDatum.reset(proj_crs_get_datum_ensemble(poContext, poOwner));
-    return poDatum ? Text(proj_get_name(poDatum.get())) : std::string();
+        poDatum.reset(Proj().proj_crs_get_datum_ensemble(poContext, poOwner));
+    return poDatum ? Text(Proj().proj_get_name(poDatum.get())) : std::string();
 }
 
 std::string ProjCRS::GetEllipsoidName() const
@@ -163,7 +163,7 @@ std::string ProjCRS::GetProjectionMethod() const
     const char* poName = nullptr;
     const ProjObject poConversion = Conversion();
     if (poConversion)
-        proj_coordoperation_get_method_info(mpoContext->Get(), poConversion.get(), &poName, nullptr, nullptr);
+        Proj().proj_coordoperation_get_method_info(mpoContext->Get(), poConversion.get(), &poName, nullptr, nullptr);
     return Text(poName);
 }
 
@@ -171,15 +171,16 @@ std::vector<ProjectionParameter> ProjCRS::GetProjectionParameters() const
 {
     std::vector<ProjectionParameter> oParameters;
     const ProjObject poConversion = Conversion();
-    const int nCount = poConversion ? proj_coordoperation_get_param_count(mpoContext->Get(), poConversion.get()) : 0;
+    const int nCount =
+        poConversion ? Proj().proj_coordoperation_get_param_count(mpoContext->Get(), poConversion.get()) : 0;
     for (int nAt = 0; nAt < nCount; ++nAt)
     {
         const char* poName = nullptr;
         const char* poUnit = nullptr;
         ProjectionParameter oParameter;
-        if (proj_coordoperation_get_param(mpoContext->Get(), poConversion.get(), nAt, &poName, nullptr, nullptr,
-                                          &oParameter.value, nullptr, &oParameter.unitFactor, &poUnit, nullptr, nullptr,
-                                          nullptr) == 0)
+        if (Proj().proj_coordoperation_get_param(mpoContext->Get(), poConversion.get(), nAt, &poName, nullptr, nullptr,
+                                                 &oParameter.value, nullptr, &oParameter.unitFactor, &poUnit, nullptr,
+                                                 nullptr, nullptr) == 0)
             continue;
         oParameter.name = Text(poName);
         oParameter.unitName = Text(poUnit);
@@ -190,26 +191,26 @@ std::vector<ProjectionParameter> ProjCRS::GetProjectionParameters() const
 
 ProjObject ProjCRS::Share(const PJ* poObject) const
 {
-    return ProjObject(proj_clone(mpoContext->Get(), poObject));
+    return ProjObject(Proj().proj_clone(mpoContext->Get(), poObject));
 }
 
 int ProjCRS::GetVerticalEPSG() const
 {
     ProjObject poObject = Unbound();
-    if (proj_get_type(poObject.get()) == PJ_TYPE_COMPOUND_CRS && FindEPSGCode(poObject.get()) == 0)
-        poObject.reset(proj_crs_get_sub_crs(mpoContext->Get(), poObject.get(), 1));
-    return proj_get_type(poObject.get()) == PJ_TYPE_VERTICAL_CRS ? FindEPSGCode(poObject.get()) : 0;
+    if (Proj().proj_get_type(poObject.get()) == PJ_TYPE_COMPOUND_CRS && FindEPSGCode(poObject.get()) == 0)
+        poObject.reset(Proj().proj_crs_get_sub_crs(mpoContext->Get(), poObject.get(), 1));
+    return Proj().proj_get_type(poObject.get()) == PJ_TYPE_VERTICAL_CRS ? FindEPSGCode(poObject.get()) : 0;
 }
 
 GeodeticParts ProjCRS::GetBase() const
 {
     GeodeticParts oParts;
-    const ProjObject poBase(proj_crs_get_geodetic_crs(mpoContext->Get(), Horizontal().get()));
+    const ProjObject poBase(Proj().proj_crs_get_geodetic_crs(mpoContext->Get(), Horizontal().get()));
     if (!poBase)
         return oParts;
-    const ProjObject poDatum(proj_crs_get_datum(mpoContext->Get(), poBase.get()));
+    const ProjObject poDatum(Proj().proj_crs_get_datum(mpoContext->Get(), poBase.get()));
     oParts.code = FindEPSGCode(poBase.get());
-    oParts.name = Text(proj_get_name(poBase.get()));
+    oParts.name = Text(Proj().proj_get_name(poBase.get()));
     oParts.datum.code = poDatum ? FindEPSGCode(poDatum.get()) : 0;
     oParts.shift = Shift();
     return oParts;
@@ -218,8 +219,8 @@ GeodeticParts ProjCRS::GetBase() const
 ProjObject ProjCRS::Unbound() const
 {
     ProjObject poObject = Share(mpoObject.get());
-    while (poObject && proj_get_type(poObject.get()) == PJ_TYPE_BOUND_CRS)
-        poObject.reset(proj_get_source_crs(mpoContext->Get(), poObject.get()));
+    while (poObject && Proj().proj_get_type(poObject.get()) == PJ_TYPE_BOUND_CRS)
+        poObject.reset(Proj().proj_get_source_crs(mpoContext->Get(), poObject.get()));
     return poObject;
 }
 
@@ -227,13 +228,13 @@ ProjObject ProjCRS::Unbound() const
 std::vector<double> ProjCRS::Shift() const
 {
     PJ_CONTEXT* poContext = mpoContext->Get();
-    const bool bBound = proj_get_type(mpoObject.get()) == PJ_TYPE_BOUND_CRS;
-    const ProjObject poShift(bBound ? proj_crs_get_coordoperation(poContext, mpoObject.get()) : nullptr);
+    const bool bBound = Proj().proj_get_type(mpoObject.get()) == PJ_TYPE_BOUND_CRS;
+    const ProjObject poShift(bBound ? Proj().proj_crs_get_coordoperation(poContext, mpoObject.get()) : nullptr);
     std::vector<double> oShift(7);
-    if (!poShift || proj_coordoperation_get_towgs84_values(poContext, poShift.get(), oShift.data(), 7, 0) == 0)
+    if (!poShift || Proj().proj_coordoperation_get_towgs84_values(poContext, poShift.get(), oShift.data(), 7, 0) == 0)
         return {};
     const char* pMethod = nullptr;
-    proj_coordoperation_get_method_info(poContext, poShift.get(), &pMethod, nullptr, nullptr);
+    Proj().proj_coordoperation_get_method_info(poContext, poShift.get(), &pMethod, nullptr, nullptr);
     if (Text(pMethod).starts_with("Geocentric translations"))
         oShift.resize(3);
     for (double& nValue : oShift)
@@ -248,12 +249,12 @@ ProjObject ProjCRS::Horizontal() const
     ProjObject poObject = Share(mpoObject.get());
     for (;;)
     {
-        const PJ_TYPE eType = proj_get_type(poObject.get());
+        const PJ_TYPE eType = Proj().proj_get_type(poObject.get());
         ProjObject poInner;
         if (eType == PJ_TYPE_BOUND_CRS)
-            poInner.reset(proj_get_source_crs(poContext, poObject.get()));
+            poInner.reset(Proj().proj_get_source_crs(poContext, poObject.get()));
         else if (eType == PJ_TYPE_COMPOUND_CRS)
-            poInner.reset(proj_crs_get_sub_crs(poContext, poObject.get(), 0));
+            poInner.reset(Proj().proj_crs_get_sub_crs(poContext, poObject.get(), 0));
         if (!poInner)
             return poObject;
         poObject = std::move(poInner);
@@ -263,19 +264,19 @@ ProjObject ProjCRS::Horizontal() const
 ProjObject ProjCRS::Conversion() const
 {
     const ProjObject poHorizontal = Horizontal();
-    if (proj_get_type(poHorizontal.get()) != PJ_TYPE_PROJECTED_CRS)
+    if (Proj().proj_get_type(poHorizontal.get()) != PJ_TYPE_PROJECTED_CRS)
         return nullptr;
-    return ProjObject(proj_crs_get_coordoperation(mpoContext->Get(), poHorizontal.get()));
+    return ProjObject(Proj().proj_crs_get_coordoperation(mpoContext->Get(), poHorizontal.get()));
 }
 
 ProjCRS::Unit ProjCRS::HorizontalUnit() const
 {
     PJ_CONTEXT* poContext = mpoContext->Get();
-    const ProjObject poSystem(proj_crs_get_coordinate_system(poContext, Horizontal().get()));
+    const ProjObject poSystem(Proj().proj_crs_get_coordinate_system(poContext, Horizontal().get()));
     Unit oUnit;
     const char* poName = nullptr;
-    if (poSystem && proj_cs_get_axis_info(poContext, poSystem.get(), 0, nullptr, nullptr, nullptr, &oUnit.factor,
-                                          &poName, nullptr, nullptr) != 0)
+    if (poSystem && Proj().proj_cs_get_axis_info(poContext, poSystem.get(), 0, nullptr, nullptr, nullptr, &oUnit.factor,
+                                                 &poName, nullptr, nullptr) != 0)
         oUnit.name = Text(poName);
     return oUnit;
 }
@@ -284,19 +285,19 @@ ProjCRS::Ellipsoid ProjCRS::FindEllipsoid() const
 {
     PJ_CONTEXT* poContext = mpoContext->Get();
     Ellipsoid oEllipsoid;
-    const ProjObject poEllipsoid(proj_get_ellipsoid(poContext, Horizontal().get()));
+    const ProjObject poEllipsoid(Proj().proj_get_ellipsoid(poContext, Horizontal().get()));
     if (!poEllipsoid)
         return oEllipsoid;
-    oEllipsoid.name = Text(proj_get_name(poEllipsoid.get()));
-    proj_ellipsoid_get_parameters(poContext, poEllipsoid.get(), &oEllipsoid.semiMajor, nullptr, nullptr,
-                                  &oEllipsoid.inverseFlattening);
+    oEllipsoid.name = Text(Proj().proj_get_name(poEllipsoid.get()));
+    Proj().proj_ellipsoid_get_parameters(poContext, poEllipsoid.get(), &oEllipsoid.semiMajor, nullptr, nullptr,
+                                         &oEllipsoid.inverseFlattening);
     return oEllipsoid;
 }
 
 std::string ProjCRS::Export(PJ_WKT_TYPE eType, const char* poKind) const
 {
     const char* const OPTIONS[] = {"MULTILINE=NO", nullptr};
-    const char* poText = proj_as_wkt(mpoContext->Get(), mpoObject.get(), eType, OPTIONS);
+    const char* poText = Proj().proj_as_wkt(mpoContext->Get(), mpoObject.get(), eType, OPTIONS);
     if (poText == nullptr)
         mpoContext->Fail("\"" + GetName() + "\" cannot be written as " + poKind, Place::Current());
     return poText;
@@ -307,7 +308,7 @@ ProjObject MakeObject(const ProjContext& oContext, const ICRS& oCRS, const Place
     const auto* poOwn = dynamic_cast<const ProjCRS*>(&oCRS);
     if (poOwn == nullptr)
         return ParseDefinition(oContext, oCRS.GetWKT(), oPlace);
-    ProjObject poObject(proj_clone(oContext.Get(), poOwn->GetObject()));
+    ProjObject poObject(Proj().proj_clone(oContext.Get(), poOwn->GetObject()));
     if (!poObject)
         oContext.Fail("\"" + oCRS.GetName() + "\" cannot be copied", oPlace);
     return poObject;

@@ -1,0 +1,119 @@
+#include "plugins/support/facetsbeside.h"
+
+#include "plugins/support/image/stackedio.h"
+#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/mathmodel/rpcmodel.h"
+
+#include <utility>
+
+namespace krv::plugins::support
+{
+
+FacetsBeside::~FacetsBeside() = default;
+
+void FacetsBeside::RefuseBeside(const std::string& what, const Place& oPlace) const
+{
+    throw DataException(moDataset.GetFileName() + ": " + what, oPlace);
+}
+
+Sidecars& FacetsBeside::FindMask(unsigned int nBitmap, const Place& oPlace) const
+{
+    Sidecars& oSidecars = moDataset.GetSidecars();
+    if (!oSidecars.HasMask(nBitmap))
+        RefuseBeside("bitmap " + std::to_string(nBitmap) + " does not exist", oPlace);
+    return oSidecars;
+}
+
+std::vector<unsigned int> FacetsBeside::GetBitmapList() const
+{
+    return moDataset.GetSidecars().ListMasks();
+}
+
+krv::datasources::IRasterIO* FacetsBeside::GetBitmapIO(const std::vector<unsigned int>& oBitmaps)
+{
+    std::vector<std::unique_ptr<krv::datasources::IRasterIO>> oParts;
+    for (const unsigned int nBitmap : oBitmaps)
+        oParts.emplace_back(FindMask(nBitmap).OpenMask(nBitmap, moDataset.WritesBeside()));
+    if (oParts.size() == 1)
+        return oParts.front().release();
+    return new StackedIO(std::move(oParts), 1, 1);
+}
+
+void FacetsBeside::DeleteBitmap(unsigned int nBitmap)
+{
+    moDataset.CheckWritingBeside("bitmaps cannot be deleted", Place::Current());
+    FindMask(nBitmap).DropMasks();
+}
+
+unsigned int FacetsBeside::CreateBitmap()
+{
+    const Place oPlace = Place::Current();
+    moDataset.CheckWritingBeside("bitmaps cannot be added", oPlace);
+    if (!moDataset.GetSidecars().ListMasks().empty())
+        RefuseBeside("validity masks lie beside the file already, and there is no place for other bitmaps", oPlace);
+    moDataset.GetSidecars().MakeMask();
+    return 1;
+}
+
+std::string FacetsBeside::GetBitmapDescription(unsigned int nBitmap) const
+{
+    return FindMask(nBitmap).DescribeMask(nBitmap);
+}
+
+// Others would take a zone beside the file for validity.
+void FacetsBeside::SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription)
+{
+    const Place oPlace = Place::Current();
+    moDataset.CheckWritingBeside("bitmaps cannot be written", oPlace);
+    Sidecars& oSidecars = FindMask(nBitmap, oPlace);
+    if (oDescription == oSidecars.DescribeMask(nBitmap))
+        return;
+    if (!oDescription.empty())
+    {
+        if (oSidecars.IsZone())
+            oSidecars.DropMasks();
+        RefuseBeside("a zone cannot be kept beside the file: a bitmap without a description, the validity mask, can",
+                     oPlace);
+    }
+    if (!oSidecars.IsZone())
+        RefuseBeside("the mask of a channel cannot become the one of the image", oPlace);
+    oSidecars.DeclareMask();
+}
+
+krv::datasources::MetadataMap FacetsBeside::GetBitmapMetadata(unsigned int nBitmap) const
+{
+    return FindMask(nBitmap).GetMaskTags(nBitmap);
+}
+
+void FacetsBeside::SetBitmapMetadata(unsigned int nBitmap, const krv::datasources::MetadataMap& oMetadata)
+{
+    if (oMetadata != GetBitmapMetadata(nBitmap))
+        RefuseBeside("a mask beside the file has no metadata");
+}
+
+std::vector<unsigned int> FacetsBeside::GetMathModelList() const
+{
+    return moDataset.GetSidecars().ListModels();
+}
+
+krv::mathmodel::IMathModel* FacetsBeside::GetMathModel(unsigned int nSegment)
+{
+    return new krv::mathmodel::RpcModel(moDataset.GetSidecars().ReadModel(nSegment));
+}
+
+unsigned int FacetsBeside::CreateMathModel(const krv::mathmodel::IMathModel& oModel)
+{
+    const Place oPlace = Place::Current();
+    moDataset.CheckWritingBeside("sensor models cannot be written", oPlace);
+    const auto* const poPolynomials = dynamic_cast<const krv::mathmodel::RpcModel*>(&oModel);
+    if (poPolynomials == nullptr)
+        RefuseBeside("a sensor model of the kind " + oModel.GetName() + " cannot be written", oPlace);
+    return moDataset.GetSidecars().SetModel(poPolynomials->GetCoefficients());
+}
+
+void FacetsBeside::DeleteMathModel(unsigned int)
+{
+    RefuseBeside("sensor models cannot be deleted: remove the text beside the file");
+}
+
+} // namespace krv::plugins::support

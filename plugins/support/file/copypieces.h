@@ -1,0 +1,24 @@
+#pragma once
+
+#include "plugins/support/file/file.h"
+#include "plugins/support/file/scratch.h"
+
+#include <cstdint>
+#include <vector>
+
+namespace krv::plugins::support
+{
+
+// Bytes that go from one file to another.
+struct CopiedPiece
+{
+    std::uint64_t mnFrom = 0;
+    std::uint64_t mnTo = 0;
+    std::uint64_t mnBytes = 0;
+};
+
+// Copies pieces in few and large calls: those that lie side by side in both files go together. In the target a single
+// byte between two pieces is filling, which may be written too. Throws what reading and writing throw.
+void CopyPieces(const File& oFrom, File& oTo, std::vector<CopiedPiece> oPieces, Scratch& oScratch);
+
+} // namespace krv::plugins::support
