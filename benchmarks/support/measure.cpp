@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <chrono>
 #include <cstdio>
+#include <ctime>
 #include <numeric>
 #include <random>
 
@@ -22,7 +23,7 @@ double Median(std::vector<double> oValues)
     return oValues[oValues.size() / 2];
 }
 
-std::vector<double> MedianSeconds(const std::vector<Candidate>& oCandidates, int nRounds)
+std::vector<double> MedianSeconds(const std::vector<Candidate>& oCandidates, int nRounds, Times eTimes)
 {
     std::vector<std::size_t> oOrder(oCandidates.size());
     std::iota(oOrder.begin(), oOrder.end(), std::size_t{0});
@@ -34,7 +35,12 @@ std::vector<double> MedianSeconds(const std::vector<Candidate>& oCandidates, int
     {
         std::shuffle(oOrder.begin(), oOrder.end(), oRandom);
         for (const std::size_t nIndex : oOrder)
-            oTimes[nIndex].push_back(Seconds(oCandidates[nIndex].moRun));
+        {
+            const std::clock_t nBegin = std::clock();
+            const double nWall = Seconds(oCandidates[nIndex].moRun);
+            const double nProcessor = static_cast<double>(std::clock() - nBegin) / CLOCKS_PER_SEC;
+            oTimes[nIndex].push_back(eTimes == Times::eWall ? nWall : nProcessor);
+        }
     }
     std::vector<double> oMedians;
     for (const auto& oValues : oTimes)

@@ -18,9 +18,16 @@ struct Candidate
     std::function<void()> moRun;
 };
 
+// Those of the processor are told from where the machine has other work; of all threads together.
+enum class Times
+{
+    eWall,
+    eProcessor
+};
+
 // Runs every candidate once unmeasured, then nRounds times in turn with the order changed every round, and returns the
 // median seconds of each.
-std::vector<double> MedianSeconds(const std::vector<Candidate>& oCandidates, int nRounds);
+std::vector<double> MedianSeconds(const std::vector<Candidate>& oCandidates, int nRounds, Times eTimes = Times::eWall);
 
 // One row of the table: what was measured, the ratio, the goal (0: none) and remarks.
 void PrintRow(const std::string& workload, double nRatio, double nGoal, const std::string& remarks = {});
