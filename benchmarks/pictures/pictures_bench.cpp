@@ -117,7 +117,7 @@ int main(int nArguments, char** pArguments)
                             {
                                 ReadTiles(file);
                             }}},
-                          static_cast<int>(oArguments.GetNumber("rounds", 5)), Clock::eProcessor);
+                          static_cast<int>(oArguments.GetNumber("rounds", 5)));
         PrintRow(std::string("whole ") + pType, oTimes[0] / oTimes[1], 0.95,
                  Number(1e-6 * nSize * nSize / oTimes[1], 1) + " million pixels a second");
     }
