@@ -43,7 +43,7 @@ struct Colour
     std::uint8_t blue;
 };
 
-constexpr Colour PAPER{255, 255, 255}, INK{0, 0, 0};
+constexpr Colour INK{0, 0, 0};
 
 bool HasAlpha(const Picture& oPicture)
 {

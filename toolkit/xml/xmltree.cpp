@@ -46,6 +46,7 @@ int FillEncoding(void*, const char* pName, XML_Encoding* poEncoding)
     if (pName[std::strspn(pName, NAMES)] != '\0')
         return XML_STATUS_ERROR;
     const iconv_t oConversion = iconv_open("UTF-32LE", pName);
+    // NOLINTNEXTLINE(performance-no-int-to-ptr): iconv's own word for a failure
     if (oConversion == reinterpret_cast<iconv_t>(-1))
         return XML_STATUS_ERROR;
     for (int nByte = 0; nByte < 256; ++nByte)
