@@ -10,7 +10,7 @@ namespace krv::tool
 {
 
 CLI::Option* AddWords(CLI::App& oVerb, const std::string& name, const std::string& what,
-                      const std::vector<std::string>& oWords, std::function<void(std::size_t)> oTake)
+                      const std::vector<std::string>& oWords, const std::function<void(std::size_t)>& oTake)
 {
     const auto Find = [oWords](const std::string& text)
     {

@@ -57,7 +57,7 @@ inline std::optional<std::string> GivenOrNone(const std::string& text)
 
 // Adds an option that takes one of some words, in any letter case. oTake: gets the place of the word in the list.
 CLI::Option* AddWords(CLI::App& oVerb, const std::string& name, const std::string& what,
-                      const std::vector<std::string>& oWords, std::function<void(std::size_t)> oTake);
+                      const std::vector<std::string>& oWords, const std::function<void(std::size_t)>& oTake);
 
 // The same for the word itself, in the letters of the list.
 inline CLI::Option* AddWord(CLI::App& oVerb, const std::string& name, std::string& oTarget, const std::string& what,
