@@ -132,7 +132,8 @@ TEST(Warp, KeepsTheTypeOfEachChannelWithAnyNumberOfThreads)
     BasicReader oMixed(half, {1}), oOne(oFolder.GetPath() + "/11.tif", {1});
     const ValiditySource oMixedValidity(oMixed.GetDataset()), oOneValidity(oOne.GetDataset());
     const RasterPtr oA(oMixed.ReadRaster(0, 0, 660, 600)), oB(oOne.ReadRaster(0, 0, 660, 600));
-    const auto oMixedMask = oMixedValidity.BuildMask(*oA), oOneMask = oOneValidity.BuildMask(*oB);
+    const std::unique_ptr<krv::gobs::Mask> oMixedMask(oMixedValidity.BuildMask(*oA)),
+        oOneMask(oOneValidity.BuildMask(*oB));
     EXPECT_LT(oOneMask->CountSet(), 660u * 600u);
     EXPECT_EQ(oMixedMask->CountSet(), oOneMask->CountSet());
 }
