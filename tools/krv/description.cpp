@@ -189,7 +189,7 @@ std::string MakeBashCompletion(const CLI::App& oApp)
         fmt::join(oNames, " "), NameList(ListNamed(oApp, nullptr)), verbs);
 }
 
-// Between the quotes of a specification: what would end one of its parts.
+// Text between the quotes in which zsh describes an option: what would end it, or one of its fields, is escaped.
 std::string ZshText(const std::string& text)
 {
     std::string result;
