@@ -6,7 +6,7 @@
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
-#include "datasources/metadata/pixelstatistics.h"
+#include "datasources/metadata/droppedtags.h"
 #include "datasources/metadata/typednodata.h"
 #include "toolkit/core/ownedorborrowed.h"
 #include "toolkit/exceptions/exceptions.h"

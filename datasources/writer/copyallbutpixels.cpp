@@ -8,7 +8,7 @@
 #include "datasources/metadata/auxdatadefaultrgbgtfm.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/metadata/detail/metadatakeys.h"
-#include "datasources/metadata/pixelstatistics.h"
+#include "datasources/metadata/droppedtags.h"
 #include "datasources/metadata/referencetag.h"
 #include "datasources/reader/idatasetaccess.h"
 #include "datasources/writer/irasterwriter.h"

@@ -4,7 +4,7 @@
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/metadata/auxiliarydata.h"
-#include "datasources/metadata/pixelstatistics.h"
+#include "datasources/metadata/droppedtags.h"
 #include "gobs/pct/pct.h"
 #include "gobs/raster/rasterinfo.h"
 #include "plugins/tif/tifbuilder.h"

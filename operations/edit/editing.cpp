@@ -5,7 +5,7 @@
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/iplaceremoval.h"
 #include "datasources/interfaces/irasterdataset.h"
-#include "datasources/metadata/pixelstatistics.h"
+#include "datasources/metadata/droppedtags.h"
 #include "datasources/metadata/typednodata.h"
 #include "operations/job/exceptions.h"
 #include "operations/source/referencesystem.h"

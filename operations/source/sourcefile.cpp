@@ -4,7 +4,7 @@
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/iomanager/datasetmanager.h"
-#include "datasources/metadata/pixelstatistics.h"
+#include "datasources/metadata/droppedtags.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/reader/validitysource.h"

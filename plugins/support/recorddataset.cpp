@@ -1,7 +1,7 @@
 #include "plugins/support/recorddataset.h"
 
+#include "datasources/metadata/droppedtags.h"
 #include "datasources/metadata/levelbook.h"
-#include "datasources/metadata/pixelstatistics.h"
 
 #include <utility>
 
@@ -53,6 +53,7 @@ void RecordDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oD
                std::to_string(GetChanCount()));
     RecordText oRecord = moRecord;
     oRecord.moTags = oData;
+    krv::datasources::DropRemoved(oRecord.moTags);
     for (const auto& [nLevel, nPlace] : moRecord.moLevels)
         CopyLevel(moRecord.moTags, oRecord.moTags, nLevel);
     Change(std::move(oRecord));

@@ -1,6 +1,6 @@
 // The reduced pages of a TIFF file as levels, and what changes of the image make of them.
+#include "datasources/metadata/droppedtags.h"
 #include "datasources/metadata/levelbook.h"
-#include "datasources/metadata/pixelstatistics.h"
 #include "plugins/support/overviewmanager.h"
 #include "plugins/tif/tifdataset.h"
 #include "plugins/tif/writing/metadatawriter.h"

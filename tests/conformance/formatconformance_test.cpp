@@ -353,6 +353,39 @@ TEST_P(FormatConformance, FilesWithCompanionsSayWhatTheseAdd)
     EXPECT_FALSE(std::filesystem::exists(file + ".aux.xml"));
 }
 
+// AuxiliaryData keeps the key of a tag that is removed, with an empty value; no file does. A format that does not
+// update its files is asked by way of what lies beside them.
+TEST_P(FormatConformance, RemovedTagsLeaveNoKeys)
+{
+    const std::string file = Make(Image());
+    const auto Edit = [&file](auto&& fChange)
+    {
+        auto* const poManager = DatasetManager::GetInstance();
+        const bool bUpdates = GetParam().moShortName == "TIF" || GetParam().moShortName == "KRVDSK";
+        const std::unique_ptr<IDataset> poDataset(bUpdates ? poManager->Open(file, eUpdate)
+                                                           : poManager->OpenFormat("GDBALL", file, eUpdate));
+        AuxiliaryData oTags = poDataset->ReadAuxiliaryData();
+        fChange(oTags);
+        poDataset->WriteAuxiliaryData(oTags);
+        poDataset->Close();
+        return std::unique_ptr<IDataset>(poManager->Open(file, eReadOnly))->ReadAuxiliaryData();
+    };
+    const AuxiliaryData oSet = Edit(
+        [](AuxiliaryData& oTags)
+        {
+            oTags.SetFileMetadataValue("own", "1");
+            oTags.SetChanMetadataValue("own", "2", 2);
+        });
+    EXPECT_TRUE(oSet.GetFileMetadata().contains("own") && oSet.GetChanMetadata(2).contains("own"));
+    const AuxiliaryData oRemoved = Edit(
+        [](AuxiliaryData& oTags)
+        {
+            oTags.RemoveFileMetadataValue("own");
+            oTags.RemoveChanMetadataValue("own", 2);
+        });
+    EXPECT_FALSE(oRemoved.GetFileMetadata().contains("own") || oRemoved.GetChanMetadata(2).contains("own"));
+}
+
 // Files of all formats side by side: the manager gives each to its own, whatever it is called.
 void Fill(BasicWriter& oWriter, unsigned char nValue)
 {

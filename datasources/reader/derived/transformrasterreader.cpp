@@ -1,8 +1,8 @@
 #include "datasources/reader/derived/transformrasterreader.h"
 
 #include "datasources/metadata/auxiliarydata.h"
+#include "datasources/metadata/droppedtags.h"
 #include "datasources/metadata/levelbook.h"
-#include "datasources/metadata/pixelstatistics.h"
 #include "datasources/metadata/typednodata.h"
 #include "datasources/reader/checkrastercompatible.h"
 #include "datasources/reader/exacthaloreader.h"

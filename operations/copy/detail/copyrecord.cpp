@@ -1,7 +1,7 @@
 #include "operations/copy/detail/copyrecord.h"
 
 #include "datasources/metadata/auxdatadefaultrgbgtfm.h"
-#include "datasources/metadata/pixelstatistics.h"
+#include "datasources/metadata/droppedtags.h"
 #include "datasources/metadata/referencetag.h"
 #include "datasources/metadata/typednodata.h"
 #include "operations/copy/detail/copymodels.h"

@@ -2,7 +2,7 @@
 
 #include "datasources/interfaces/channelinfo.h"
 #include "datasources/interfaces/idataset.h"
-#include "datasources/metadata/pixelstatistics.h"
+#include "datasources/metadata/droppedtags.h"
 #include "datasources/reader/checkrastercompatible.h"
 #include "datasources/reader/defaultreader.h"
 #include "gobs/mask/mask.h"

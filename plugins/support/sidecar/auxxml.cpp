@@ -1,6 +1,6 @@
 #include "plugins/support/sidecar/auxxml.h"
 
-#include "datasources/metadata/pixelstatistics.h"
+#include "datasources/metadata/droppedtags.h"
 #include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/xml/xmlwriter.h"
@@ -194,6 +194,12 @@ void AuxXml::ReadBand(const Element& oBand)
     }
     if (!oRest.children.empty())
         moRoot.children.push_back(std::move(oRest));
+}
+
+void AuxXml::SetTags(const krv::datasources::AuxiliaryData& oTags)
+{
+    moTags = oTags;
+    krv::datasources::DropRemoved(moTags);
 }
 
 bool AuxXml::DropStatistics()

@@ -39,7 +39,7 @@ public:
 
     void SetCRS(const std::string& definition) { moCRS = definition; }
     void SetGeocoding(const std::optional<krv::ogc::cs::GeocodingInfo>& oInfo) { moGeocoding = oInfo; }
-    void SetTags(const krv::datasources::AuxiliaryData& oTags) { moTags = oTags; }
+    void SetTags(const krv::datasources::AuxiliaryData& oTags);
     void SetStamp(const Stamp& oStamp) { moStamp = oStamp; }
 
     // Statistics and histograms, which do not hold when pixels change. True when there were any.

@@ -1,7 +1,7 @@
 #include "datasources/reader/derived/detail/convertedrecord.h"
 
+#include "datasources/metadata/droppedtags.h"
 #include "datasources/metadata/levelbook.h"
-#include "datasources/metadata/pixelstatistics.h"
 
 namespace krv::datasources::detail
 {
