@@ -19,25 +19,17 @@ bool IsStatistics(const std::string& key)
     return Begins("STATISTICS_") || Begins("Histogram_") || ::strcasecmp(key.c_str(), "LAYER_CRC") == 0;
 }
 
-bool DropStatisticsOf(MetadataMap& oMap)
-{
-    return std::erase_if(oMap, [](const auto& oEntry) { return IsStatistics(oEntry.first); }) != 0;
-}
-
-bool DropRemovedOf(MetadataMap& oMap)
-{
-    return std::erase_if(oMap, [](const auto& oEntry) { return oEntry.second.empty(); }) != 0;
-}
-
-// Lets `pDrop` work on the map of the file and on those of the channels. Maps that stay as they are are not set.
-bool DropFromAll(AuxiliaryData& oRecord, bool (*pDrop)(MetadataMap&))
+// Lets `fDrop` work on the map of the file, as channel 0, and on those of the channels. Maps that stay as they are are
+// not set.
+template <class Drop>
+bool DropFromAll(AuxiliaryData& oRecord, Drop&& fDrop)
 {
     MetadataMap oFileMap = oRecord.GetFileMetadata();
-    bool bAny = pDrop(oFileMap);
+    bool bAny = fDrop(oFileMap, 0u);
     if (bAny)
         oRecord.SetFileMetadata(oFileMap);
     for (unsigned int nChannel = 1; nChannel <= oRecord.GetChannelCount(); ++nChannel)
-        if (MetadataMap oMap = oRecord.GetChanMetadata(nChannel); pDrop(oMap))
+        if (MetadataMap oMap = oRecord.GetChanMetadata(nChannel); fDrop(oMap, nChannel))
         {
             oRecord.SetChanMetadata(oMap, nChannel);
             bAny = true;
@@ -49,16 +41,28 @@ bool DropFromAll(AuxiliaryData& oRecord, bool (*pDrop)(MetadataMap&))
 
 bool DropStatistics(MetadataMap& oMap)
 {
-    return DropStatisticsOf(oMap);
+    return std::erase_if(oMap, [](const auto& oEntry) { return IsStatistics(oEntry.first); }) != 0;
 }
 
 bool DropStatistics(AuxiliaryData& oRecord)
 {
-    return DropFromAll(oRecord, DropStatisticsOf);
+    return DropFromAll(oRecord, [](MetadataMap& oMap, unsigned int) { return DropStatistics(oMap); });
 }
 
-bool DropRemoved(AuxiliaryData& oRecord)
+bool DropRemoved(AuxiliaryData& oRecord, const AuxiliaryData& oBefore)
 {
+    const auto DropRemovedOf = [&oBefore](MetadataMap& oMap, unsigned int nChannel)
+    {
+        if (nChannel > oBefore.GetChannelCount())
+            return false;
+        const MetadataMap& oOld = nChannel == 0 ? oBefore.GetFileMetadata() : oBefore.GetChanMetadata(nChannel);
+        const auto IsRemoved = [&oOld](const auto& oEntry)
+        {
+            const auto oFound = oOld.find(oEntry.first);
+            return oEntry.second.empty() && oFound != oOld.end() && !oFound->second.empty();
+        };
+        return std::erase_if(oMap, IsRemoved) != 0;
+    };
     return DropFromAll(oRecord, DropRemovedOf);
 }
 

@@ -1,5 +1,6 @@
 #include "plugins/raw/envirecord.h"
 
+#include "datasources/metadata/droppedtags.h"
 #include "plugins/raw/rawform.h"
 #include "toolkit/core/lettercase.h"
 #include "toolkit/core/numbertext.h"
@@ -352,10 +353,11 @@ AuxiliaryData ReadTags(const HeaderText& oHeader, unsigned int nChannels)
     return oTags;
 }
 
-AuxiliaryData WriteTags(const AuxiliaryData& oTags, HeaderText& oHeader)
+AuxiliaryData WriteTags(AuxiliaryData oTags, HeaderText& oHeader)
 {
     const unsigned int nChannels = oTags.GetChannelCount();
     const AuxiliaryData oOld = ReadTags(oHeader, nChannels);
+    krv::datasources::DropRemoved(oTags, oOld);
     MetadataMap oFile = oTags.GetFileMetadata();
     std::vector<MetadataMap> oChannels;
     std::vector<std::string> oNames;
@@ -364,8 +366,6 @@ AuxiliaryData WriteTags(const AuxiliaryData& oTags, HeaderText& oHeader)
         oChannels.push_back(oTags.GetChanMetadata(nChannel));
         oNames.push_back(oTags.GetChannelDescription(nChannel));
     }
-    // An empty value is how a tag is dropped.
-    std::erase_if(oFile, [](const auto& oEntry) { return oEntry.second.empty(); });
     for (const auto& [key, value] : oOld.GetFileMetadata())
         if (!oFile.contains(key))
             oHeader.Remove(key);

@@ -20,7 +20,7 @@ namespace krv::plugins::raw
 
 krv::datasources::AuxiliaryData ReadTags(const HeaderText& oHeader, unsigned int nChannels);
 // Makes the header say the tags as far as it can, and no others; returns what it cannot say.
-krv::datasources::AuxiliaryData WriteTags(const krv::datasources::AuxiliaryData& oTags, HeaderText& oHeader);
+krv::datasources::AuxiliaryData WriteTags(krv::datasources::AuxiliaryData oTags, HeaderText& oHeader);
 
 // By "map info" along the axes of the map; no value when there is none, for one that is rotated, since readers do not
 // agree on the direction, and for one without sense.

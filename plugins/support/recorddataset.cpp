@@ -53,7 +53,7 @@ void RecordDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oD
                std::to_string(GetChanCount()));
     RecordText oRecord = moRecord;
     oRecord.moTags = oData;
-    krv::datasources::DropRemoved(oRecord.moTags);
+    krv::datasources::DropRemoved(oRecord.moTags, moRecord.moTags);
     for (const auto& [nLevel, nPlace] : moRecord.moLevels)
         CopyLevel(moRecord.moTags, oRecord.moTags, nLevel);
     Change(std::move(oRecord));

@@ -198,8 +198,9 @@ void AuxXml::ReadBand(const Element& oBand)
 
 void AuxXml::SetTags(const krv::datasources::AuxiliaryData& oTags)
 {
-    moTags = oTags;
-    krv::datasources::DropRemoved(moTags);
+    krv::datasources::AuxiliaryData oNew = oTags;
+    krv::datasources::DropRemoved(oNew, moTags);
+    moTags = std::move(oNew);
 }
 
 bool AuxXml::DropStatistics()
