@@ -28,6 +28,7 @@ using krv::mathmodel::RpcModel;
 
 constexpr std::size_t POINTS = 65536;
 constexpr int ROUNDS = 21;
+constexpr int LINK_ROUNDS = 101; // a pass takes milliseconds, and a hundredth is of interest
 
 RpcCoefficients MakeModel()
 {
@@ -176,7 +177,7 @@ void MeasureLinks()
                                               {
                                                   ReadTiles(*poLink);
                                               }}},
-                                            ROUNDS);
+                                            LINK_ROUNDS);
         PrintRow(std::string("link to ") + pFormat, oSeconds[0] / oSeconds[1], 0.98,
                  Number(48 / 1024.0 / oSeconds[1]) + " GiB/s");
     }

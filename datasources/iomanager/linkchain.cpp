@@ -23,6 +23,8 @@ class LinkFollower
 public:
     LinkFollower(const std::string& target, const Place& oPlace) : moTarget(target), moPlace(oPlace) {}
 
+    const std::vector<std::string>& GetFiles() const { return moFiles; }
+
     void Follow(const IDataset& oDataset, unsigned int nLinks)
     {
         const auto* const poLinked = dynamic_cast<const ILinkedDataset*>(&oDataset);
@@ -33,10 +35,11 @@ public:
             std::error_code oNone;
             if (std::filesystem::equivalent(file, moTarget, oNone))
                 throw DataException(moTarget + ": the file would be linked to itself, by way of others", moPlace);
-            if (nLinks >= MAXIMUM_LINKS || ++mnFiles > MAXIMUM_FILES)
+            if (nLinks >= MAXIMUM_LINKS || moFiles.size() >= MAXIMUM_FILES)
                 throw DataException(moTarget + ": more than " + std::to_string(MAXIMUM_LINKS) +
                                         " links lead to the pixels; link to the file that holds them",
                                     moPlace);
+            moFiles.push_back(file);
             if (const std::unique_ptr<IDataset> poNext = TryOpen(file))
                 Follow(*poNext, nLinks + 1);
         }
@@ -57,14 +60,16 @@ private:
 
     std::string moTarget;
     Place moPlace;
-    unsigned int mnFiles = 0;
+    std::vector<std::string> moFiles;
 };
 
 } // namespace
 
-void CheckLinkChain(const IDataset& oSource, const std::string& target, const Place& oPlace)
+std::vector<std::string> FollowLinks(const IDataset& oSource, const std::string& target, const Place& oPlace)
 {
-    LinkFollower(target, oPlace).Follow(oSource, 1);
+    LinkFollower oFollower(target, oPlace);
+    oFollower.Follow(oSource, 1);
+    return oFollower.GetFiles();
 }
 
 } // namespace krv::datasources

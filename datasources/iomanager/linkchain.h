@@ -4,6 +4,7 @@
 #include "toolkit/exceptions/place.h"
 
 #include <string>
+#include <vector>
 
 namespace krv::datasources
 {
@@ -14,9 +15,10 @@ class IDataset;
 inline constexpr unsigned int MAXIMUM_LINKS = 8;
 
 // Follows the links of `oSource`, to which `target` is or will be linked, and opens the files that they lead to one
-// after the other. Throws DataException when they come back to `target` or are more than MAXIMUM_LINKS, that of
-// `target` among them. A file that cannot be opened ends its chain here: it is reported when its pixels are read.
-KRV_DATASOURCES_API void CheckLinkChain(const IDataset& oSource, const std::string& target,
-                                        const Place& oPlace = Place::Current());
+// after the other; returns their names. Throws DataException when they come back to `target` or are more than
+// MAXIMUM_LINKS, that of `target` among them. A file that cannot be opened ends its chain here: it is reported when its
+// pixels are read.
+KRV_DATASOURCES_API std::vector<std::string> FollowLinks(const IDataset& oSource, const std::string& target,
+                                                         const Place& oPlace = Place::Current());
 
 } // namespace krv::datasources

@@ -107,7 +107,7 @@ IDataset* CreateLinkedPix(std::string target, std::string source)
     std::error_code oNone;
     if (std::filesystem::equivalent(target, source, oNone))
         throw DataException(target + ": a file cannot be linked to itself");
-    CheckLinkChain(*poSource, target, Place::Current());
+    FollowLinks(*poSource, target, Place::Current());
 
     NewLink oLink(target, "FILENOCREATE=" + MakeRelativePath(target, source));
     auto* const poTo = dynamic_cast<IRasterDataset*>(oLink.Get());

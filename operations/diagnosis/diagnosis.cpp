@@ -229,6 +229,14 @@ std::string DescribeOpened(IDataset& oDataset)
 
 constexpr const char* DAMAGE_REMEDY = "get an undamaged copy, or convert it to a plainer kind";
 
+bool AreAllValid(const IOverviewManager& oLevels, unsigned int nLevel, unsigned int nChannels)
+{
+    bool bValid = true;
+    for (unsigned int nChannel = 1; nChannel <= nChannels; ++nChannel)
+        bValid = bValid && oLevels.IsValid(nChannel, nLevel);
+    return bValid;
+}
+
 // Reads what the other verbs read beside pixels, one thing after the other, so that each that fails is named.
 void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Finding>& oFindings)
 {
@@ -256,8 +264,19 @@ void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Findin
                     std::unique_ptr<IDataset>(
                         DatasetManager::GetInstance()->OpenFormat("GDBALL", oDataset.GetName(), eReadOnly));
                 const bool bPixels = poLevels != nullptr && poRaster->GetChanCount() != 0;
+                std::vector<unsigned int> oOutdated;
                 for (const unsigned int nLevel : bPixels ? poLevels->GetLevels() : std::vector<unsigned int>())
+                {
                     ReadEnds(*std::unique_ptr<IRasterIO>(poLevels->GetOverviewIO(nLevel, {1})));
+                    if (!AreAllValid(*poLevels, nLevel, poRaster->GetChanCount()))
+                        oOutdated.push_back(nLevel);
+                }
+                if (!oOutdated.empty())
+                    oFindings.push_back(
+                        {false, subject,
+                         fmt::format("outdated levels are passed over, since pixels changed after they were made: {}",
+                                     fmt::join(oOutdated, ", ")),
+                         fmt::format("make them anew: krv overviews FILE --levels {}", fmt::join(oOutdated, ","))});
             });
     if (auto* const poBitmaps = dynamic_cast<IBitmapDataset*>(&oDataset); poBitmaps != nullptr)
         Try("the bitmaps",

@@ -93,7 +93,7 @@ std::vector<LevelFacts> FindLevels(IRasterReader& oReader)
     for (const unsigned int nLevel : poAccessor->GetLevels())
     {
         const std::unique_ptr<IRasterReader> poLevel(poAccessor->CreateRasterReader(nLevel));
-        oLevels.push_back({nLevel, poLevel->GetWidth(), poLevel->GetHeight()});
+        oLevels.push_back({nLevel, poLevel->GetWidth(), poLevel->GetHeight(), poAccessor->IsLevelValid(nLevel)});
     }
     return oLevels;
 }

@@ -52,6 +52,7 @@ struct LevelFacts
     unsigned int level = 0;
     unsigned int width = 0;
     unsigned int height = 0;
+    bool valid = true; // made of the pixels that the image has; others are passed over
 };
 
 struct BitmapFacts

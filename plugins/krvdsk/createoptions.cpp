@@ -11,6 +11,7 @@ namespace
 {
 
 constexpr std::uint32_t LARGEST_LEVEL = 22;
+constexpr std::uint32_t LARGEST_SAMPLE_BITS = 64;
 constexpr std::string_view LINK_KEY = "FILENOCREATE=";
 
 // The keys, whose values go to oDefaults.
@@ -26,6 +27,7 @@ support::Options MakeKeys(Catalogue& oDefaults)
     oKeys.AddNumber("BLOCKXSIZE", oDefaults.mnBlockWidth, 1, Catalogue::LARGEST_BLOCK_SIDE);
     oKeys.AddNumber("BLOCKYSIZE", oDefaults.mnBlockHeight, 1, Catalogue::LARGEST_BLOCK_SIDE);
     oKeys.AddChoice("INTERLEAVE", oDefaults.mbSeparate, {{"PIXEL", false}, {"BAND", true}});
+    oKeys.AddNumber("NBITS", oDefaults.mnKeptBits, 1, LARGEST_SAMPLE_BITS);
     return oKeys;
 }
 
@@ -49,6 +51,8 @@ CreateOptions CreateOptions::Parse(const std::string& options, const Place& oPla
         oOptions.moLinked = options.substr(nLink + LINK_KEY.size());
     support::Options oKeys = MakeKeys(oOptions.moDefaults);
     oKeys.Parse(options.substr(0, nLink), oPlace);
+    if (oOptions.moLinked && oKeys.IsGiven("NBITS"))
+        throw DataException("The option NBITS does not go with a link: the values are those of the other file", oPlace);
     const codec::BlockCodec* const pCodec = codec::FindBlockCodec(GetCodingName(oOptions.moDefaults.meCoding));
     const int nMost = pCodec == nullptr ? 0 : pCodec->mnMaximumLevel;
     if (oOptions.moDefaults.mnCodingLevel > nMost)

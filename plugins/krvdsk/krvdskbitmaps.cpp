@@ -277,7 +277,7 @@ krv::datasources::IOverviewManager* KrvdskDataset::GetBitmapOverviewManager()
             TakeBitmap(nTheirs);
     };
     return new LinkedLevels(mpoLink, std::move(poOwn), std::move(poTheirs),
-                            {FindSource, TakeOver, false, static_cast<unsigned int>(GetBitmapList().size())});
+                            {FindSource, TakeOver, {}, {}, false, static_cast<unsigned int>(GetBitmapList().size())});
 }
 
 } // namespace krv::plugins::krvdsk

@@ -99,6 +99,7 @@ void KrvdskDataset::Create(unsigned int nWidth, unsigned int nHeight, const std:
             AddPlanes(oCatalogue, oTypes, oPlace);
         else
             LinkChannels(oCatalogue, oTypes, oPlace);
+        oCatalogue.mnKeptBits = 0;
         mpoWriter->LayOut();
         mpoStore = mpoWriter->GetStore();
         ShowFile();
@@ -178,6 +179,7 @@ void KrvdskDataset::StoreRecord(const support::RecordText& oRecord) const
             {
                 mpoWriter->DropTable(*poPlane->moTables.at(nLevel));
                 poPlane->moTables.erase(nLevel);
+                poPlane->moMadeOf.erase(nLevel);
             }
     for (const auto& [nLevel, oSize] : oLevels)
         for (const std::shared_ptr<Plane>& poPlane : oCatalogue.GetLevelPlanes())

@@ -2,6 +2,7 @@
 
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/iblockencoding.h"
+#include "datasources/interfaces/iblocktransfer.h"
 #include "datasources/interfaces/iencodedblocks.h"
 #include "datasources/interfaces/iephemerisdataset.h"
 #include "datasources/interfaces/ihistoryio.h"
@@ -43,7 +44,8 @@ class KrvdskDataset : public support::RecordDataset,
                       public krv::datasources::IStorageDataset,
                       public krv::datasources::IVerifiedDataset,
                       public krv::datasources::IEncodedBlocks,
-                      public krv::datasources::IBlockEncoding
+                      public krv::datasources::IBlockEncoding,
+                      public krv::datasources::IBlockTransfer
 {
 public:
     // Throws krv::FileException kinds that name file and cause; nothing stays open then.
@@ -58,6 +60,8 @@ public:
     // After both of these, I/O objects made before are of no more use.
     void AddNewChannel(const krv::gobs::RasterInfo& oInfo) override;
     void DeleteChannel(unsigned int nChannel) override;
+    // Of a linked channel as the other file has it stored, while that can be had.
+    krv::datasources::IChannelInfo* GetChannelInfo(unsigned int nChannel) const override;
     krv::datasources::IHistoryIO* GetHistoryIO(unsigned int nChannel) override;
     void Close() override;
     bool IsLinked() const override { return !GetCatalogue().moLinkPath.empty(); }
@@ -123,6 +127,8 @@ public:
     void StoreEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock, const unsigned char* pBytes,
                       std::size_t nBytes) override;
     krv::datasources::IBlockEncoder* MakeBlockEncoder(unsigned int nLevel) override;
+    bool TakeBlocks(unsigned int nLevel, krv::datasources::IDataset& oSource,
+                    const std::vector<krv::datasources::BlockNumber>& oBlocks) override;
 
 protected:
     void StoreRecord(const support::RecordText& oRecord) const override;
@@ -169,6 +175,9 @@ private:
     template <class Facet>
     Facet* FindLinkedSegment(const std::string& kind, unsigned int nNumber,
                              std::vector<unsigned int> (Facet::*pList)() const) const;
+    // Whether the other file changed since a level was made of it.
+    bool IsOutdated(unsigned int nChannel, unsigned int nLevel) const;
+    void NoteMadeOf(unsigned int nChannel, unsigned int nLevel);
     void TakeLevel(unsigned int nLevel, krv::datasources::IOverviewManager& oTheirs);
     void TakeBitmap(unsigned int nBitmap);
     // Of a bitmap that comes, none of whose levels is valid.
@@ -185,6 +194,10 @@ private:
     // Throws DataException for a level that does not exist.
     ImageSize GetLevelSize(unsigned int nLevel, const Place& oPlace) const;
     CodedTile FindTile(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock, const Place& oPlace) const;
+    static std::string DescribeTile(const CodedTile& oAt, const krv::datasources::BlockNumber& oBlock);
+    // Where a tile lies, after its place was checked.
+    Entry FindEntry(const CodedTile& oAt, const krv::datasources::BlockNumber& oBlock) const;
+    void StoreTiles(unsigned int nLevel, const std::function<void(StoreWriter& oWriter)>& oStore, const Place& oPlace);
     bool TakesStorage(const krv::datasources::EncodedForm& oForm, unsigned int nLevel) const;
     std::unique_ptr<Catalogue> MakeCatalogue(const krv::datasources::EncodedForm& oForm, const Place& oPlace) const;
     // A level of which nothing is stored gets another size.

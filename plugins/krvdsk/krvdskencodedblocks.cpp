@@ -2,6 +2,8 @@
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/metadata/levelbook.h"
 #include "plugins/krvdsk/krvdskdataset.h"
+#include "plugins/support/writing/narrowsamples.h"
+#include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -18,6 +20,8 @@ namespace
 
 // Strips of fewer pixels are not taken over as tiles, unless there is but one.
 constexpr std::uint64_t LEAST_STRIP = 32768;
+// Of values that keep fewer bits than their type has: how many. Others do not take such blocks: they store so many.
+constexpr const char* KEPT_BITS = "KEPTBITS";
 
 // Whether all channels are stored in one way, in one plane or each in its own.
 bool HasOneForm(const Catalogue& oCatalogue)
@@ -30,7 +34,7 @@ bool HasOneForm(const Catalogue& oCatalogue)
                        {
                            return poPlane->moType == oFirst.moType && poPlane->meCoding == oFirst.meCoding &&
                                   poPlane->mnPredictor == oFirst.mnPredictor &&
-                                  poPlane->meStorage == oFirst.meStorage &&
+                                  poPlane->mnKeptBits == oFirst.mnKeptBits && poPlane->meStorage == oFirst.meStorage &&
                                   poPlane->GetChannels() == poPlane->GetStoredChannels() &&
                                   (oCatalogue.moPlanes.size() == 1 || poPlane->GetChannels() == 1);
                        });
@@ -54,6 +58,18 @@ std::optional<Coding> FindCoding(const std::string& name)
     return std::nullopt;
 }
 
+// The bits that values keep, 0 for all of them; none when the codec goes by what is not known here.
+std::optional<std::uint8_t> FindKeptBits(const EncodedForm& oForm)
+{
+    if (oForm.moParameters.empty())
+        return 0;
+    const auto oFound = oForm.moParameters.find(KEPT_BITS);
+    const auto oBits =
+        oFound == oForm.moParameters.end() ? std::nullopt : krv::ParseNumber<std::uint8_t>(oFound->second);
+    const bool bKnown = oForm.moParameters.size() == 1 && oBits && support::CanNarrow(oForm.moType, *oBits);
+    return bKnown ? oBits : std::nullopt;
+}
+
 // Whether channels of the file's types can be stored so, whatever the grid of tiles.
 bool IsPossible(const Catalogue& oCatalogue, const EncodedForm& oForm)
 {
@@ -62,7 +78,7 @@ bool IsPossible(const Catalogue& oCatalogue, const EncodedForm& oForm)
                     [&oForm](const std::shared_ptr<Plane>& poPlane) { return poPlane->moType == oForm.moType; });
     return bTypes && oCatalogue.moLinkPath.empty() && oForm.mnChannels != 0 &&
            oForm.mnChannels == oCatalogue.CountChannels() && oForm.mnSampleBits == oForm.moType.GetValueBits() &&
-           FindCoding(oForm.moCodec) && !oForm.mbLossy && !oForm.mbBigEndian && oForm.moParameters.empty() &&
+           FindCoding(oForm.moCodec) && !oForm.mbLossy && !oForm.mbBigEndian && FindKeptBits(oForm) &&
            oForm.moTables.empty() && oForm.mnPredictor <= 3 &&
            Plane::CanPredict(static_cast<std::uint8_t>(oForm.mnPredictor), oForm.moType) &&
            (oForm.mnPredictor == 1 || oForm.moCodec != GetCodingName(Coding::eNone)) &&
@@ -180,6 +196,8 @@ EncodedForm KrvdskDataset::GetEncodedForm(unsigned int nLevel)
         oForm.mnPredictor = oFirst.mnPredictor;
         oForm.moType = oFirst.moType;
         oForm.mnSampleBits = oFirst.moType.GetValueBits();
+        if (oFirst.mnKeptBits != 0)
+            oForm.moParameters[KEPT_BITS] = std::to_string(oFirst.mnKeptBits);
         bWhole = oFirst.meStorage == Storage::eWholeTiles;
     }
     if (oForm.mbReadable)
@@ -222,19 +240,30 @@ bool KrvdskDataset::ReadEncoded(unsigned int nLevel, const BlockNumber& oBlock, 
     if (mpoWriter)
         mpoWriter->StoreHeld();
     oBytes.clear();
-    const TileTable::Tile* const pTile = oAt.mpoTable->Find(*mpoStore, oAt.mnTile);
-    if (pTile == nullptr)
+    const Entry oEntry = FindEntry(oAt, oBlock);
+    if (!oEntry.IsStored())
         return false;
-    const Entry& oEntry = pTile->moEntry;
-    const std::string what =
-        oAt.mpoTable->Describe() + ", tile " + std::to_string(oBlock.mnColumn) + ", " + std::to_string(oBlock.mnRow);
-    mpoStore->CheckPlace(oEntry, what);
-    if (oEntry.mnBytes > oAt.mnMost || (oAt.mbPlain && oEntry.mnBytes != oAt.mnMost))
-        mpoStore->Fail(what + ": is damaged: it has " + std::to_string(oEntry.mnBytes) + " bytes");
     oBytes.resize(oEntry.mnBytes);
     if (mpoStore->ReadSummed(oEntry.mnOffset, oBytes.data(), oBytes.size()) != oEntry.mnChecksum)
-        mpoStore->Fail(what + ": is damaged: its checksum is wrong");
+        mpoStore->Fail(DescribeTile(oAt, oBlock) + ": is damaged: its checksum is wrong");
     return true;
+}
+
+std::string KrvdskDataset::DescribeTile(const CodedTile& oAt, const BlockNumber& oBlock)
+{
+    return oAt.mpoTable->Describe() + ", tile " + std::to_string(oBlock.mnColumn) + ", " + std::to_string(oBlock.mnRow);
+}
+
+Entry KrvdskDataset::FindEntry(const CodedTile& oAt, const BlockNumber& oBlock) const
+{
+    const TileTable::Tile* const pTile = oAt.mpoTable->Find(*mpoStore, oAt.mnTile);
+    if (pTile == nullptr)
+        return {};
+    mpoStore->CheckPlace(pTile->moEntry, DescribeTile(oAt, oBlock));
+    const std::size_t nBytes = pTile->moEntry.mnBytes;
+    if (nBytes > oAt.mnMost || (oAt.mbPlain && nBytes != oAt.mnMost))
+        mpoStore->Fail(DescribeTile(oAt, oBlock) + ": is damaged: it has " + std::to_string(nBytes) + " bytes");
+    return pTile->moEntry;
 }
 
 // Tiles that end with the image and such that do not are the same as long as none reaches beyond it.
@@ -286,6 +315,7 @@ std::unique_ptr<Catalogue> KrvdskDataset::MakeCatalogue(const EncodedForm& oForm
     const bool bUsual = poNew->meCoding == Coding::eNone || oForm.mnPredictor == Plane::GetUsualPredictor(oForm.moType);
     poNew->mnPredictor = bUsual ? 0 : static_cast<std::uint8_t>(oForm.mnPredictor);
     poNew->mbSeparate = oForm.mbSeparate;
+    poNew->mnKeptBits = FindKeptBits(oForm).value();
     poNew->moPlanes.clear();
     const bool bWhole = oForm.mbWholeBlocks && !IsExact(poNew->moSize, {poNew->mnBlockWidth, poNew->mnBlockHeight});
     try
@@ -301,6 +331,7 @@ std::unique_ptr<Catalogue> KrvdskDataset::MakeCatalogue(const EncodedForm& oForm
     {
         return nullptr;
     }
+    poNew->mnKeptBits = 0;
     return poNew->FindObstacle(*poNew->moPlanes.front()).empty() ? std::move(poNew) : nullptr;
 }
 
@@ -339,7 +370,7 @@ bool KrvdskDataset::SetEncodedForm(unsigned int nLevel, const EncodedForm& oForm
     }
     const Plane& oFirst = *oCatalogue.moPlanes.front();
     const bool bSame = HasOneForm(oCatalogue) && oForm.moCodec == GetCodingName(oFirst.meCoding) &&
-                       oForm.mnPredictor == oFirst.mnPredictor &&
+                       oForm.mnPredictor == oFirst.mnPredictor && FindKeptBits(oForm) == oFirst.mnKeptBits &&
                        (oForm.mnChannels == 1 || oForm.mbSeparate == (oCatalogue.moPlanes.size() > 1));
     if (!bSame || !IsOfGrid(oCatalogue, oForm) || !TakesStorage(oForm, nLevel))
         return false;
@@ -356,16 +387,45 @@ void KrvdskDataset::StoreEncoded(unsigned int nLevel, const BlockNumber& oBlock,
                                  std::size_t nBytes)
 {
     const Place oPlace = Place::Current();
-    StoreWriter& oWriter = GetWriter("blocks cannot be written", oPlace);
     const CodedTile oAt = FindTile(nLevel, oBlock, oPlace);
     if (pBytes == nullptr || nBytes == 0 || nBytes > oAt.mnMost || (oAt.mbPlain && nBytes != oAt.mnMost))
         Refuse("a tile of " + std::to_string(nBytes) + " bytes cannot be stored", oPlace);
+    StoreTiles(
+        nLevel, [&](StoreWriter& oWriter) { oWriter.WriteTile(*oAt.mpoTable, oAt.mnTile, pBytes, nBytes); }, oPlace);
+}
+
+void KrvdskDataset::StoreTiles(unsigned int nLevel, const std::function<void(StoreWriter& oWriter)>& oStore,
+                               const Place& oPlace)
+{
+    StoreWriter& oWriter = GetWriter("blocks cannot be written", oPlace);
     support::BlockImage& oImage = nLevel == 1 ? *GetImage(oPlace) : *OpenLevel(nLevel);
     if (nLevel == 1)
         ForgetOldPixels();
-    oWriter.StoreHeld(); // what is held back of the tile must not come after it
-    oWriter.WriteTile(*oAt.mpoTable, oAt.mnTile, pBytes, nBytes);
+    oWriter.StoreHeld(); // what is held back of a tile must not come after it
+    oStore(oWriter);
     oImage.DropBlocks();
+}
+
+bool KrvdskDataset::TakeBlocks(unsigned int nLevel, krv::datasources::IDataset& oSource,
+                               const std::vector<BlockNumber>& oBlocks)
+{
+    const Place oPlace = Place::Current();
+    auto* const poSource = dynamic_cast<KrvdskDataset*>(&oSource);
+    if (poSource == nullptr || poSource == this || poSource->FindLinkedBlocks(nLevel) != nullptr)
+        return false;
+    if (poSource->mpoWriter)
+        poSource->mpoWriter->StoreHeld();
+    std::vector<StoreWriter::TakenTile> oTiles;
+    for (const BlockNumber& oBlock : oBlocks)
+    {
+        const CodedTile oTo = FindTile(nLevel, oBlock, oPlace), oFrom = poSource->FindTile(nLevel, oBlock, oPlace);
+        if (const Entry oEntry = poSource->FindEntry(oFrom, oBlock); oEntry.IsStored())
+            oTiles.push_back({oTo.mpoTable.get(), oTo.mnTile, oEntry, DescribeTile(oFrom, oBlock)});
+    }
+    if (!oTiles.empty())
+        StoreTiles(
+            nLevel, [&](StoreWriter& oWriter) { oWriter.TakeTiles(*poSource->mpoStore, oTiles); }, oPlace);
+    return true;
 }
 
 IBlockEncoder* KrvdskDataset::MakeBlockEncoder(unsigned int nLevel)

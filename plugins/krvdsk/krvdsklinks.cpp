@@ -108,6 +108,13 @@ std::vector<std::string> KrvdskDataset::GetLinkedFiles() const
     return mpoLink ? std::vector<std::string>{mpoLink->GetName()} : std::vector<std::string>();
 }
 
+krv::datasources::IChannelInfo* KrvdskDataset::GetChannelInfo(unsigned int nChannel) const
+{
+    const unsigned int nLinked = FindLinked(nChannel);
+    const auto* const poTheirs = nLinked != 0 && mpoLink ? mpoLink->Find<IRasterDataset>() : nullptr;
+    return poTheirs != nullptr ? poTheirs->GetChannelInfo(nLinked) : RecordDataset::GetChannelInfo(nChannel);
+}
+
 // Linked channels alone are handed through. Together with others they come block by block like all channels do, which
 // also refuses lists that make no sense.
 IRasterIO* KrvdskDataset::GetRasterIO(const std::vector<unsigned int>& oChannels)
@@ -125,10 +132,10 @@ IRasterIO* KrvdskDataset::GetRasterIO(const std::vector<unsigned int>& oChannels
 IOverviewManager* KrvdskDataset::GetOverviewManager()
 {
     std::unique_ptr<IOverviewManager> poOwn(RecordDataset::GetOverviewManager());
-    auto* const poLinked = mpoLink && !GetCatalogue().moLinked.empty() ? mpoLink->Find<IRasterDataset>() : nullptr;
-    std::unique_ptr<IOverviewManager> poTheirs(poLinked != nullptr ? poLinked->GetOverviewManager() : nullptr);
-    if (!poTheirs)
+    if (!mpoLink || GetCatalogue().moLinked.empty())
         return poOwn.release();
+    auto* const poLinked = mpoLink->Find<IRasterDataset>();
+    std::unique_ptr<IOverviewManager> poTheirs(poLinked != nullptr ? poLinked->GetOverviewManager() : nullptr);
     const auto FindSource = [this](unsigned int nChannel, unsigned int nLevel)
     {
         const unsigned int nLinked = FindLinked(nChannel);
@@ -136,14 +143,46 @@ IOverviewManager* KrvdskDataset::GetOverviewManager()
             return nLinked;
         return GetCatalogue().moLinkedPlanes[nChannel - 1]->moTables.at(nLevel)->IsEmpty() ? nLinked : 0;
     };
-    const auto TakeOver = [this, poOther = std::shared_ptr<IOverviewManager>(poLinked->GetOverviewManager())](
-                              unsigned int nChannel, unsigned int nLevel)
+    const auto TakeOver =
+        [this, poOther = std::shared_ptr<IOverviewManager>(poTheirs ? poLinked->GetOverviewManager() : nullptr)](
+            unsigned int nChannel, unsigned int nLevel)
     {
         if (nChannel != 0)
             TakeLevel(nLevel, *poOther);
     };
+    const auto IsOld = [this](unsigned int nChannel, unsigned int nLevel)
+    {
+        return IsOutdated(nChannel, nLevel);
+    };
+    const auto NoteMade = [this](unsigned int nChannel, unsigned int nLevel)
+    {
+        NoteMadeOf(nChannel, nLevel);
+    };
     return new LinkedLevels(mpoLink, std::move(poOwn), std::move(poTheirs),
-                            {FindSource, TakeOver, true, GetChanCount()});
+                            {FindSource, TakeOver, IsOld, NoteMade, true, GetChanCount()});
+}
+
+// While the other file is not there its levels are as good as they were.
+bool KrvdskDataset::IsOutdated(unsigned int nChannel, unsigned int nLevel) const
+{
+    if (FindLinked(nChannel) == 0)
+        return false;
+    const auto& oMadeOf = GetCatalogue().moLinkedPlanes[nChannel - 1]->moMadeOf;
+    const auto oFound = oMadeOf.find(nLevel);
+    const auto oNow = oFound == oMadeOf.end() || !mpoLink ? std::nullopt : mpoLink->FindState();
+    return oNow && *oNow != oFound->second;
+}
+
+void KrvdskDataset::NoteMadeOf(unsigned int nChannel, unsigned int nLevel)
+{
+    if (FindLinked(nChannel) == 0)
+        return;
+    auto& oMadeOf = mpoWriter->GetCatalogue().moLinkedPlanes[nChannel - 1]->moMadeOf;
+    if (const auto oNow = mpoLink->FindState())
+        oMadeOf[nLevel] = *oNow;
+    else
+        oMadeOf.erase(nLevel);
+    mpoWriter->Touch();
 }
 
 // A level of the other file becomes one of the file's own, for all linked channels whose it is.
@@ -168,6 +207,7 @@ void KrvdskDataset::TakeLevel(unsigned int nLevel, IOverviewManager& oTheirs)
                 poTo(poOwn->GetOverviewIO(nLevel, {nChannel}));
             CopyImage(*poFrom, *poTo, GetCatalogue().moLinked[nChannel - 1].moType.GetValueBits() / 8);
             poOwn->SetValid(nChannel, nLevel, oTheirs.IsValid(nSource, nLevel));
+            NoteMadeOf(nChannel, nLevel);
         }
     }
     catch (...)

@@ -91,8 +91,9 @@ std::string TellImage(IRasterDataset& oRaster, const AuxiliaryData& oRecord)
         const std::unique_ptr<IChannelInfo> poInfo(oRaster.GetChannelInfo(nChannel));
         const krv::gobs::DataType oType = poInfo->GetDataType();
         const std::size_t nBytes = oType.GetValueBits() / 8;
-        text += oType.Describe() + " " + oRecord.GetChannelDescription(nChannel) + "\n" +
-                Text(oRecord.GetChanMetadata(nChannel)) + Sum(oRaster.GetRasterIO({nChannel}), nBytes) +
+        text += oType.Describe() + " of " + std::to_string(poInfo->GetNativeDataType().GetBits()) + " bits " +
+                oRecord.GetChannelDescription(nChannel) + "\n" + Text(oRecord.GetChanMetadata(nChannel)) +
+                Sum(oRaster.GetRasterIO({nChannel}), nBytes) +
                 TellLevels(oRaster.GetOverviewManager(), nChannel, nBytes);
         if (IHistoryIO* const poHistory = oRaster.GetHistoryIO(nChannel))
             for (const std::string& entry : poHistory->ReadHistory())

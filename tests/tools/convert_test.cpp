@@ -138,11 +138,13 @@ TEST(Convert, RealFilesKeepPixelsAndInformationInEveryLayout)
     EXPECT_GT(nForm, 30U);
 }
 
-// There and back, in this process: pixels, tags, levels, masks, tables and models, of files with loss as they decode.
+// There, from one native file to another, and back, in this process: pixels, tags, levels, masks, tables and models, of
+// files with loss as they decode.
 TEST(Convert, RealFilesComeBackFromNativeFiles)
 {
     const TempFolder oFolder;
-    const std::string there = oFolder.File("there.krv"), back = oFolder.File("back.tif");
+    const std::string there = oFolder.File("there.krv"), again = oFolder.File("again.krv"),
+                      back = oFolder.File("back.tif");
     unsigned int nFiles = 0;
     for (const Facts& oRow : krv::test::GetFacts())
     {
@@ -152,7 +154,8 @@ TEST(Convert, RealFilesComeBackFromNativeFiles)
             continue;
         operations::Convert({{oRow.GetPath()}, {}, {}, {}}, {there, "", ""});
         EXPECT_EQ(krv::test::TellDataset(*OpenFile(there, eReadOnly)), told);
-        operations::Convert({{there}, {}, {}, {}}, {back, "", ""});
+        operations::Convert({{there}, {}, {}, {}}, {again, "", ""});
+        operations::Convert({{again}, {}, {}, {}}, {back, "", ""});
         EXPECT_EQ(krv::test::TellDataset(*OpenFile(back, eReadOnly)), told);
         ++nFiles;
     }

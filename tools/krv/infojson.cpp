@@ -60,7 +60,7 @@ Json CrsToJson(const std::optional<CrsFacts>& oCrs)
 
 Json ToJson(const LevelFacts& oLevel)
 {
-    return {{"level", oLevel.level}, {"width", oLevel.width}, {"height", oLevel.height}};
+    return {{"level", oLevel.level}, {"width", oLevel.width}, {"height", oLevel.height}, {"valid", oLevel.valid}};
 }
 
 Json ToJson(const BitmapFacts& oBitmap)

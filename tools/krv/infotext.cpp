@@ -141,8 +141,9 @@ std::string OverviewsText(const Json& oLevels)
 {
     std::string text;
     for (const Json& oLevel : oLevels)
-        text += fmt::format("{}{}: {} x {}", text.empty() ? "" : ", ", oLevel["level"].get<unsigned int>(),
-                            oLevel["width"].get<unsigned int>(), oLevel["height"].get<unsigned int>());
+        text += fmt::format("{}{}: {} x {}{}", text.empty() ? "" : ", ", oLevel["level"].get<unsigned int>(),
+                            oLevel["width"].get<unsigned int>(), oLevel["height"].get<unsigned int>(),
+                            oLevel["valid"] == true ? "" : " (outdated)");
     return text.empty() ? "" : Line("overviews", text);
 }
 

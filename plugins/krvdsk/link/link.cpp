@@ -8,6 +8,8 @@
 
 #include <filesystem>
 
+#include <sys/stat.h>
+
 namespace krv::plugins::krvdsk
 {
 
@@ -22,6 +24,17 @@ krv::gobs::DataType GetType(const IRasterDataset& oRaster, unsigned int nChannel
 {
     const std::unique_ptr<IChannelInfo> poInfo(oRaster.GetChannelInfo(nChannel));
     return poInfo->GetDataType();
+}
+
+std::optional<Link::State> ReadState(const std::string& name)
+{
+    struct stat oStatus = {};
+    if (stat(name.c_str(), &oStatus) != 0)
+        return std::nullopt;
+    constexpr std::uint64_t SECOND = 1'000'000'000;
+    return Link::State{static_cast<std::uint64_t>(oStatus.st_size),
+                       static_cast<std::uint64_t>(oStatus.st_mtim.tv_sec) * SECOND +
+                           static_cast<std::uint64_t>(oStatus.st_mtim.tv_nsec)};
 }
 
 } // namespace
@@ -54,6 +67,12 @@ IDataset* Link::Find() noexcept
     }
 }
 
+std::optional<Link::State> Link::FindState() noexcept
+{
+    Find();
+    return moState;
+}
+
 void Link::Rethrow(const Place& oPlace) const
 {
     try
@@ -76,18 +95,33 @@ void Link::Open(const Place& oPlace)
     std::error_code oNone;
     if (std::filesystem::equivalent(moName, moOwner, oNone))
         throw DataException(moOwner + ": the file is linked to itself", oPlace);
-    try
+    moState = ReadState(moName);
+    const auto Try = [&](const auto& oStep)
     {
-        poDataset.reset(krv::datasources::DatasetManager::GetInstance()->Open(moName, eReadOnly));
-        if (!poDataset)
-            throw DataException("it cannot be opened");
-        Check(*poDataset);
-    }
-    catch (const krv::Exception&)
-    {
-        Rethrow(oPlace);
-    }
-    krv::datasources::CheckLinkChain(*poDataset, moOwner, oPlace);
+        try
+        {
+            oStep();
+        }
+        catch (const krv::Exception&)
+        {
+            Rethrow(oPlace);
+        }
+    };
+    Try(
+        [&]
+        {
+            poDataset.reset(krv::datasources::DatasetManager::GetInstance()->Open(moName, eReadOnly));
+            if (!poDataset)
+                throw DataException("it cannot be opened");
+        });
+    // Before anything of it is asked that would open what it leads to.
+    for (const std::string& file : krv::datasources::FollowLinks(*poDataset, moOwner, oPlace))
+        if (const auto oState = ReadState(file); oState && moState)
+        {
+            moState->mnBytes += oState->mnBytes;
+            moState->mnModified += oState->mnModified;
+        }
+    Try([&] { Check(*poDataset); });
     mpoDataset = std::move(poDataset);
 }
 

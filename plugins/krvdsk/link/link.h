@@ -5,7 +5,9 @@
 #include "gobs/raster/datatype.h"
 #include "toolkit/exceptions/place.h"
 
+#include <cstdint>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -22,6 +24,16 @@ public:
     {
         unsigned int mnNumber = 0; // in the other file
         krv::gobs::DataType moType;
+    };
+
+    // By which a change of the other file is noticed: its bytes and when it was modified, in nanoseconds since 1970; of
+    // one that is linked itself the sums with those of the files that it leads to, modulo 2^64.
+    struct State
+    {
+        std::uint64_t mnBytes = 0;
+        std::uint64_t mnModified = 0;
+
+        friend bool operator==(const State&, const State&) = default;
     };
 
     // owner: the native file; path: from its folder to the other one.
@@ -47,6 +59,9 @@ public:
         return dynamic_cast<Facet*>(Find());
     }
 
+    // What it was before it was opened, or is when it cannot be; no value when it is not there.
+    std::optional<State> FindState() noexcept;
+
     // Throws krv::IOException: what went wrong with the other file, naming both. To be called in a catch block of
     // krv::Exception alone.
     [[noreturn]] void Rethrow(const Place& oPlace = Place::Current()) const;
@@ -60,6 +75,7 @@ private:
     unsigned int mnWidth;
     unsigned int mnHeight;
     std::vector<Channel> moChannels;
+    std::optional<State> moState;
     std::unique_ptr<krv::datasources::IDataset> mpoDataset;
 };
 

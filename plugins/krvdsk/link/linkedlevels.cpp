@@ -89,7 +89,9 @@ void LinkedLevels::CreateLevel(unsigned int nLevel)
 bool LinkedLevels::IsValid(unsigned int nChannel, unsigned int nLevel) const
 {
     const unsigned int nSource = FindSource(nChannel, nLevel);
-    return nSource != 0 ? mpoTheirs->IsValid(nSource, nLevel) : mpoOwn->IsValid(nChannel, nLevel);
+    if (nSource != 0)
+        return mpoTheirs->IsValid(nSource, nLevel);
+    return mpoOwn->IsValid(nChannel, nLevel) && !(moOwner.moIsOutdated && moOwner.moIsOutdated(nChannel, nLevel));
 }
 
 void LinkedLevels::DeleteLevel(unsigned int nLevel)
@@ -118,6 +120,8 @@ void LinkedLevels::SetValid(unsigned int nChannel, unsigned int nLevel, bool bVa
             mpoOwn->CreateLevel(nLevel);
     }
     mpoOwn->SetValid(nChannel, nLevel, bValid);
+    if (bValid && moOwner.moNoteMade)
+        moOwner.moNoteMade(nChannel, nLevel);
 }
 
 unsigned int LinkedLevels::GetLevelWidth(unsigned int nLevel) const

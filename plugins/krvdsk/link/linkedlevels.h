@@ -24,6 +24,10 @@ public:
         std::function<unsigned int(unsigned int nChannel, unsigned int nLevel)> moFindSource;
         // Makes it the file's own, since it is to be changed. 0 for a channel: a level is to be made for all of them.
         std::function<void(unsigned int nChannel, unsigned int nLevel)> moTakeOver;
+        // Whether a level of the file's own was made of pixels that the other one no longer has, and that it was made
+        // of those that it has; empty where that does not matter.
+        std::function<bool(unsigned int nChannel, unsigned int nLevel)> moIsOutdated;
+        std::function<void(unsigned int nChannel, unsigned int nLevel)> moNoteMade;
         // Whether the file's own levels have room for the linked channels too.
         bool mbForAll;
         unsigned int mnChannels;

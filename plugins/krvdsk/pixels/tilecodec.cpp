@@ -2,6 +2,7 @@
 
 #include "plugins/support/codec/bits.h"
 #include "plugins/support/codec/predictor.h"
+#include "plugins/support/writing/narrowsamples.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/raster/interleave.h"
 
@@ -148,6 +149,15 @@ std::span<const unsigned char> TileCodec::EncodeStored(const unsigned char* pSou
                                                        std::size_t nWidth, std::size_t nRows)
 {
     const std::size_t nRowBytes = GetStoredRowBytes(nWidth), nBytes = nRowBytes * nRows;
+    if (moPlane.mnKeptBits != 0)
+    {
+        const std::size_t nKeptPitch = nWidth * moPlane.GetChannels() * moPlane.moType.GetValueBits() / 8;
+        unsigned char* const pKept = moKept.Get(nKeptPitch * nRows);
+        raster::CopyRows(pSource, nPitch, pKept, nKeptPitch, nKeptPitch, nRows);
+        support::MakeNarrowing(moPlane.moType, moPlane.mnKeptBits)(pKept, nKeptPitch * nRows);
+        pSource = pKept;
+        nPitch = nKeptPitch;
+    }
     const unsigned char* pRows = pSource;
     if (IsBits())
         pRows = PackBits(pSource, nPitch, nWidth, nRows);

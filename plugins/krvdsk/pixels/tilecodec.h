@@ -43,8 +43,8 @@ public:
     void Pick(const unsigned char* pStored, std::size_t nStoredPitch, std::size_t nWidth, std::size_t nRows,
               unsigned char* pTarget, std::size_t nPitch) const;
 
-    // The same the other way. Valid until the next call; may be the source itself. Empty: all bits are 0, and nothing
-    // need be stored.
+    // The same the other way; of values what is kept of them. Valid until the next call; may be the source itself.
+    // Empty: all bits are 0, and nothing need be stored.
     std::span<const unsigned char> Encode(const unsigned char* pSource, std::size_t nPitch, unsigned int nWidth,
                                           unsigned int nRows);
 
@@ -67,6 +67,7 @@ private:
     support::Scratch moPredicted;
     support::Scratch moCoded;
     support::Scratch moWhole;
+    support::Scratch moKept;
     std::vector<unsigned char> moPredictorScratch;
 };
 

@@ -1,6 +1,7 @@
 #include "plugins/krvdsk/pixels/tilesource.h"
 
 #include "plugins/support/codec/checksum.h"
+#include "plugins/support/writing/narrowsamples.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/raster/interleave.h"
 
@@ -28,6 +29,13 @@ std::size_t ChooseBound(const support::ImageLayout& oLayout, std::size_t nPixelB
     return static_cast<std::size_t>(std::clamp(nRow > nMost ? nMost : nRow * std::min(nRows, nMost), nLeast, nMost));
 }
 
+support::HeldBlocks::SettlePixels MakeSettling(const Plane& oPlane)
+{
+    if (oPlane.moType.GetBits() < 8)
+        return &support::HeldBlocks::SettleBits;
+    return oPlane.mnKeptBits == 0 ? nullptr : support::MakeNarrowing(oPlane.moType, oPlane.mnKeptBits);
+}
+
 } // namespace
 
 support::ImageLayout TileSource::MakeLayout(const Catalogue& oCatalogue, const Origin& oOrigin)
@@ -37,7 +45,7 @@ support::ImageLayout TileSource::MakeLayout(const Catalogue& oCatalogue, const O
     {
         const bool bBits = poPlane->moType.GetBits() < 8;
         oPlanes.push_back({bBits ? krv::gobs::DataType(krv::gobs::eDT_8U) : poPlane->moType, poPlane->GetChannels(),
-                           poPlane->moType});
+                           poPlane->GetNativeType()});
     }
     return {oOrigin.moSize.mnWidth, oOrigin.moSize.mnHeight, oCatalogue.mnBlockWidth, oCatalogue.mnBlockHeight,
             std::move(oPlanes)};
@@ -64,11 +72,10 @@ std::unique_ptr<TileSource::Work> TileSource::MakeWork(std::size_t nPlane)
     {
         StoreTile(*moWorks[nPlane], {oBlock.mnNumber, oBlock.moRect}, pPixels, oBlock.moRect.mnWidth * nPixelBytes);
     };
-    return std::unique_ptr<Work>(
-        new Work{poPlane, poPlane->moTables.at(moOrigin.mnLevel),
-                 TileCodec(*poPlane, {moLayout.GetBlockWidth(), moLayout.GetBlockHeight()}),
-                 support::HeldBlocks(ChooseBound(moLayout, nPixelBytes), nPixelBytes, StoreBlock,
-                                     poPlane->moType.GetBits() < 8 ? &support::HeldBlocks::SettleBits : nullptr)});
+    return std::unique_ptr<Work>(new Work{
+        poPlane, poPlane->moTables.at(moOrigin.mnLevel),
+        TileCodec(*poPlane, {moLayout.GetBlockWidth(), moLayout.GetBlockHeight()}),
+        support::HeldBlocks(ChooseBound(moLayout, nPixelBytes), nPixelBytes, StoreBlock, MakeSettling(*poPlane))});
 }
 
 TileSource::Spot TileSource::GetSpot(const support::BlockAddress& oBlock) const

@@ -1,5 +1,6 @@
 #include "plugins/krvdsk/store/catalogue.h"
 
+#include "plugins/support/writing/narrowsamples.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -70,6 +71,29 @@ void AddPlane(BytesWriter& oWriter, const Plane& oPlane)
     }
 }
 
+void AddMadeOf(BytesWriter& oWriter, const Plane& oPlane)
+{
+    for (const auto& [nLevel, poTable] : oPlane.moTables)
+    {
+        const auto oFound = oPlane.moMadeOf.find(nLevel);
+        const Link::State oState = oFound == oPlane.moMadeOf.end() ? Link::State() : oFound->second;
+        oWriter.AddNumber(oState.mnBytes, 8);
+        oWriter.AddNumber(oState.mnModified, 8);
+    }
+}
+
+void ReadMadeOf(BytesReader& oReader, Plane& oPlane)
+{
+    for (const auto& [nLevel, poTable] : oPlane.moTables)
+    {
+        Link::State oState;
+        oState.mnBytes = oReader.ReadNumber(8);
+        oState.mnModified = oReader.ReadNumber(8);
+        if (oState != Link::State())
+            oPlane.moMadeOf[nLevel] = oState;
+    }
+}
+
 void AddLevels(BytesWriter& oWriter, const std::map<unsigned int, ImageSize>& oLevels)
 {
     oWriter.AddNumber(oLevels.size(), 4);
@@ -102,6 +126,11 @@ const char* GetCodingName(Coding eCoding)
 unsigned int Plane::GetChannels() const
 {
     return static_cast<unsigned int>(std::count(moThere.begin(), moThere.end(), true));
+}
+
+krv::gobs::DataType Plane::GetNativeType() const
+{
+    return mnKeptBits == 0 ? moType : krv::gobs::DataType(mnKeptBits, moType.IsSigned(), moType.IsReal(), 0, 0, false);
 }
 
 std::uint8_t Plane::GetUsualPredictor(const krv::gobs::DataType& oType)
@@ -191,6 +220,11 @@ std::shared_ptr<Plane> Catalogue::MakePlane(const krv::gobs::DataType& oType, un
     if (!Plane::CanPredict(poPlane->mnPredictor, oType))
         throw DataException(name + ": predictor " + std::to_string(mnPredictor) + " does not go with the type " +
                                 oType.Describe(),
+                            oPlace);
+    poPlane->mnKeptBits = mnKeptBits == oType.GetValueBits() ? 0 : mnKeptBits;
+    if (poPlane->mnKeptBits != 0 && !support::CanNarrow(oType, mnKeptBits))
+        throw DataException(name + ": the option NBITS=" + std::to_string(mnKeptBits) +
+                                " does not go with values of type " + oType.Describe(),
                             oPlace);
     poPlane->moThere.assign(nChannels, true);
     const std::string obstacle = FindObstacle(*poPlane);
@@ -286,9 +320,16 @@ std::vector<unsigned char> Catalogue::Write() const
                     }
                     for (const std::shared_ptr<Plane>& poPlane : moLinkedPlanes)
                         AddPlane(oItem, *poPlane);
+                    for (const std::shared_ptr<Plane>& poPlane : moLinkedPlanes)
+                        AddMadeOf(oItem, *poPlane);
                 });
     for (const std::shared_ptr<Plane>& poPlane : moPlanes)
-        AddItem(PLANE, [&poPlane](BytesWriter& oItem) { AddPlane(oItem, *poPlane); });
+        AddItem(PLANE,
+                [&poPlane](BytesWriter& oItem)
+                {
+                    AddPlane(oItem, *poPlane);
+                    oItem.AddNumber(poPlane->mnKeptBits, 1);
+                });
     for (const auto& oPair : moSegments)
         AddItem(SEGMENT,
                 [&oPair](BytesWriter& oItem)
@@ -390,6 +431,9 @@ void Catalogue::ReadLink(BytesReader oItem)
         if (moLinkedPlanes.back()->moType != oChannel.moType)
             oItem.Fail("the levels of a linked channel are of another type than it is");
     }
+    if (oItem.GetLeft() != 0)
+        for (const std::shared_ptr<Plane>& poPlane : moLinkedPlanes)
+            ReadMadeOf(oItem, *poPlane);
     if (moLinkPath.empty() || moLinkPath.find('\0') != moLinkPath.npos)
         oItem.Fail("a link leads nowhere");
 }
@@ -432,6 +476,12 @@ Catalogue Catalogue::Read(const StoreFile& oStore, const std::vector<unsigned ch
         else if (name == PLANE)
         {
             oCatalogue.moPlanes.push_back(oCatalogue.ReadPlane(oItem, Use::eChannels));
+            Plane& oPlane = *oCatalogue.moPlanes.back();
+            if (oItem.GetLeft() != 0)
+                oPlane.mnKeptBits = static_cast<std::uint8_t>(oItem.ReadNumber(1));
+            if (oPlane.mnKeptBits != 0 && !support::CanNarrow(oPlane.moType, oPlane.mnKeptBits))
+                oItem.Fail(std::to_string(oPlane.mnKeptBits) + " bits of a value of type " + oPlane.moType.Describe() +
+                           " cannot be");
             nChannels += oCatalogue.moPlanes.back()->GetChannels();
         }
         else if (name == LINK && oCatalogue.moLinkPath.empty())

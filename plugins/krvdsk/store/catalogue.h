@@ -45,13 +45,18 @@ struct Plane
     Coding meCoding = Coding::eNone;
     std::uint8_t mnCodingLevel = 0; // for what is written; 0: the coding's own
     std::uint8_t mnPredictor = 1;   // 1: none, 2: differences along the rows, 3: byte planes of reals with differences
+    std::uint8_t mnKeptBits = 0;    // of a value, which is stored with all that its type has; 0: all
     // Of the channels that are stored, which are there: those that were deleted stay in the tiles.
     std::vector<bool> moThere;
     std::map<unsigned int, std::shared_ptr<TileTable>> moTables; // by level, 1 for the image
-    bool mbGone = false;                                         // was deleted
+    // Of a linked channel: of which state of the other file its levels were made, as far as that is known.
+    std::map<unsigned int, Link::State> moMadeOf;
+    bool mbGone = false; // was deleted
 
     unsigned int GetStoredChannels() const { return static_cast<unsigned int>(moThere.size()); }
     unsigned int GetChannels() const;
+    // With the bits that are kept.
+    krv::gobs::DataType GetNativeType() const;
     // Bits of a pixel as stored.
     std::uint64_t GetPixelBits() const { return moType.GetValueBits() * moThere.size(); }
     // As it goes with the type: 2 for integers, 3 for reals, 1 for complex values and bits.
@@ -117,6 +122,8 @@ struct Catalogue
     std::uint8_t mnCodingLevel = 0;
     std::uint8_t mnPredictor = 0; // 0: the usual one
     bool mbSeparate = false;      // every channel in a plane of its own
+    // Of the channels that a new file begins with; 0: all.
+    std::uint8_t mnKeptBits = 0;
 
     // Channels count through those that lie in another file, and then through the planes.
     std::string moLinkPath; // of that file, from the folder of this one; empty: there is none

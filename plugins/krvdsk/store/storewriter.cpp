@@ -23,6 +23,9 @@ constexpr std::uint64_t LITTLE_ROOM = std::uint64_t{64} << 10;
 // Moved without asking whether so much was written.
 constexpr std::uint64_t LITTLE_BYTES = std::uint64_t{64} << 20;
 
+// What is copied from file to file at a time lies in the processor's second cache still.
+constexpr std::uint64_t COPIED_BYTES = std::uint64_t{256} << 10;
+
 // The disk is told to begin with so many at a time.
 constexpr std::uint64_t BEGUN_BYTES = std::uint64_t{1} << 20;
 
@@ -218,6 +221,79 @@ void StoreWriter::WriteTile(TileTable& oTable, std::uint64_t nTile, const unsign
         throw;
     }
     Release(oOld.moEntry, oOld.mnGeneration);
+}
+
+void StoreWriter::CopyTiles(const StoreFile& oFrom, const std::vector<TakenTile>& oTiles,
+                            const std::vector<support::Extent>& oRooms)
+{
+    const auto Follows = [&](std::size_t nAt)
+    {
+        const Entry& oLast = oTiles[nAt - 1].moEntry;
+        const std::uint64_t nRoom = std::uint64_t{oLast.mnBytes} + oLast.mnBytes % 2;
+        return oTiles[nAt].moEntry.mnOffset == oLast.mnOffset + nRoom &&
+               oRooms[nAt].mnOffset == oRooms[nAt - 1].mnOffset + nRoom;
+    };
+    std::vector<unsigned char> oBytes(COPIED_BYTES);
+    for (std::size_t nFirst = 0, nEnd = 0; nFirst < oTiles.size(); nFirst = nEnd)
+    {
+        const std::uint64_t nFrom = oTiles[nFirst].moEntry.mnOffset;
+        std::uint64_t nBytes = oTiles[nFirst].moEntry.mnBytes;
+        for (nEnd = nFirst + 1; nEnd < oTiles.size() && Follows(nEnd); ++nEnd)
+        {
+            const std::uint64_t nTogether = oTiles[nEnd].moEntry.mnOffset - nFrom + oTiles[nEnd].moEntry.mnBytes;
+            if (nTogether > COPIED_BYTES)
+                break;
+            nBytes = nTogether;
+        }
+        std::uint32_t nSum = 0; // of a tile that comes in several pieces
+        for (std::uint64_t nAt = 0; nAt < nBytes; nAt += COPIED_BYTES)
+        {
+            const auto nPart = static_cast<std::size_t>(std::min<std::uint64_t>(COPIED_BYTES, nBytes - nAt));
+            oFrom.GetFile().Read(nFrom + nAt, oBytes.data(), nPart);
+            for (std::size_t nTile = nFirst; nTile < nEnd; ++nTile)
+            {
+                const Entry& oEntry = oTiles[nTile].moEntry;
+                const std::size_t nOwn = nEnd - nFirst == 1 ? nPart : oEntry.mnBytes;
+                nSum = codec::Checksum(nEnd - nFirst == 1 ? nSum : 0, &oBytes[oEntry.mnOffset - nFrom], nOwn);
+                if (nAt + nPart == nBytes && nSum != oEntry.mnChecksum)
+                    oFrom.Fail(oTiles[nTile].moWhat + ": is damaged: its checksum is wrong");
+            }
+            GetFile()->Write(oRooms[nFirst].mnOffset + nAt, oBytes.data(), nPart);
+        }
+        mpoStore->SetEnd(std::max(mpoStore->GetEnd(), oRooms[nFirst].mnOffset + nBytes));
+        mnWritten += nBytes;
+    }
+}
+
+void StoreWriter::TakeTiles(const StoreFile& oFrom, const std::vector<TakenTile>& oTiles)
+{
+    CheckWritable();
+    std::vector<TileTable::Tile> oOld;
+    std::vector<support::Extent> oRooms;
+    try
+    {
+        for (const TakenTile& oTile : oTiles)
+        {
+            const TileTable::Tile* const pOld = oTile.mpTable->Find(*mpoStore, oTile.mnTile);
+            oOld.push_back(pOld == nullptr ? TileTable::Tile() : *pOld);
+            oRooms.push_back(mpoSpace->Allocate(oTile.moEntry.mnBytes));
+        }
+        CopyTiles(oFrom, oTiles, oRooms);
+    }
+    catch (...)
+    {
+        for (const support::Extent& oRoom : oRooms)
+            mpoSpace->Release(oRoom);
+        throw;
+    }
+    for (std::size_t nAt = 0; nAt < oTiles.size(); ++nAt)
+    {
+        const Entry& oEntry = oTiles[nAt].moEntry;
+        const support::Extent& oRoom = oRooms[nAt];
+        oTiles[nAt].mpTable->Set(*mpoStore, oTiles[nAt].mnTile,
+                                 {{oRoom.mnOffset, oEntry.mnBytes, oEntry.mnChecksum}, oRoom.mnGeneration, true});
+        Release(oOld[nAt].moEntry, oOld[nAt].mnGeneration);
+    }
 }
 
 void StoreWriter::DropTile(TileTable& oTable, std::uint64_t nTile)

@@ -48,6 +48,16 @@ public:
     // Puts bytes in the place of what an entry names. nGeneration: of its room.
     void Replace(Entry& oEntry, std::uint64_t& nGeneration, const std::vector<unsigned char>& oBytes);
     void WriteTile(TileTable& oTable, std::uint64_t nTile, const unsigned char* pBytes, std::size_t nBytes);
+    // Tiles of another file as they are stored there, with their checksums, which are compared on the way: all of them,
+    // or none when it throws. Those side by side go together.
+    struct TakenTile
+    {
+        TileTable* mpTable; // of this file
+        std::uint64_t mnTile;
+        Entry moEntry; // in the other file, where it may lie
+        std::string moWhat;
+    };
+    void TakeTiles(const StoreFile& oFrom, const std::vector<TakenTile>& oTiles);
     // The tile becomes one that is not stored.
     void DropTile(TileTable& oTable, std::uint64_t nTile);
     void DropTable(TileTable& oTable);
@@ -73,6 +83,8 @@ private:
     void FindUsed();
     void BeginFlush(const support::Extent& oPiece);
     support::Extent WritePiece(const void* pBytes, std::size_t nBytes);
+    void CopyTiles(const StoreFile& oFrom, const std::vector<TakenTile>& oTiles,
+                   const std::vector<support::Extent>& oRooms);
     void Release(const Entry& oEntry, std::uint64_t nGeneration);
     void WriteBlob(Blob& oBlob);
     void WriteRecords();

@@ -1,5 +1,6 @@
 #include "plugins/tif/writing/pagemodel.h"
 
+#include "plugins/support/writing/narrowsamples.h"
 #include "plugins/tif/reading/compression.h"
 #include "toolkit/exceptions/exceptions.h"
 
@@ -44,14 +45,10 @@ std::uint16_t GetSampleFormat(const krv::gobs::DataType& oType)
 // The bits of one sample as it is stored: narrower than the type only where the type comes back when it is read.
 unsigned int ChooseBits(const NewImage& oImage, const CreateOptions& oOptions, const Place& oPlace)
 {
-    constexpr unsigned int MOST_PACKED_BITS = 32;
     const krv::gobs::DataType& oType = oImage.moType;
     const unsigned int nWhole = oType.GetValueBits();
     const unsigned int nBits = oOptions.mnSampleBits == 0 ? nWhole : oOptions.mnSampleBits;
-    const bool bReal = oType.IsReal() && nWhole == 32 && (nBits == 16 || nBits == 24);
-    const bool bInteger =
-        !oType.IsReal() && nBits < nWhole && nBits <= MOST_PACKED_BITS && (nWhole == 8 || nBits > nWhole / 2);
-    if (nBits != nWhole && (oType.IsComplex() || !(bReal || bInteger)))
+    if (nBits != nWhole && !support::CanNarrow(oType, nBits))
         throw DataException("The option NBITS=" + std::to_string(nBits) + " does not go with values of type " +
                                 oType.Describe(),
                             oPlace);

@@ -1,6 +1,6 @@
 #include "plugins/tif/writing/pagewriter.h"
 
-#include "plugins/support/codec/bits.h"
+#include "plugins/support/writing/narrowsamples.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/raster/interleave.h"
 
@@ -34,31 +34,7 @@ support::HeldBlocks::SettlePixels MakeSettling(const SampleForm& oSample, PixelU
 {
     if (eUse == PixelUse::eBitmap)
         return &support::HeldBlocks::SettleBits;
-    const auto Reals = [](auto* pNarrow, auto* pWiden, std::size_t nNarrowBytes)
-    {
-        return [=](unsigned char* pPixels, std::size_t nBytes)
-        {
-            const std::size_t nCount = nBytes / sizeof(float);
-            std::vector<unsigned char> oNarrow(nCount * nNarrowBytes);
-            pNarrow(pPixels, oNarrow.data(), nCount);
-            pWiden(oNarrow.data(), pPixels, nCount);
-        };
-    };
-    switch (oSample.meWidening)
-    {
-    case Widening::eNone:
-        return nullptr;
-    case Widening::eHalf:
-        return Reals(&codec::FloatToHalf, &codec::HalfToFloat, 2);
-    case Widening::eFloat24:
-        return Reals(&codec::FloatToFloat24, &codec::Float24ToFloat, 3);
-    default:
-        return [oSample](unsigned char* pPixels, std::size_t nBytes)
-        {
-            const std::size_t nValueBytes = oSample.GetValueBytes();
-            codec::FitBits(pPixels, nBytes / nValueBytes, nValueBytes, oSample.GetBits(), oSample.IsSigned());
-        };
-    }
+    return oSample.meWidening == Widening::eNone ? nullptr : support::MakeNarrowing(oSample.moType, oSample.GetBits());
 }
 
 } // namespace

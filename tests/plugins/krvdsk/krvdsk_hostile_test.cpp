@@ -153,6 +153,9 @@ TEST(KrvdskHostile, DirectoriesThatContradictThemselvesAreRefused)
          "type 77"},
         {"predictor of reals", [&](std::string& directory, Root&) { directory[directory.find(planes) + ITEM + 3] = 3; },
          "predictor 3"},
+        {"bits",
+         [&](std::string& directory, Root&) { directory[directory.find(planes, directory.find(planes) + 1) - 1] = 9; },
+         "9 bits of a value of type 8U"},
         {"no channel", [&](std::string& directory, Root&) { directory[directory.find(planes) + ITEM + 9] = 0; },
          "no channels"},
         {"later version", [](std::string&, Root& oRoot) { oRoot.mnVersion = 2; },
@@ -172,6 +175,42 @@ TEST(KrvdskHostile, DirectoriesThatContradictThemselvesAreRefused)
               std::string::npos);
 }
 
+// Of what comes from another file as it is stored there checksums are compared too: all of it comes, or nothing.
+TEST(KrvdskHostile, DamageIsNotTakenOver)
+{
+    const TempFolder oFolder;
+    const std::string fileName = oFolder.File("damaged.krv"), options = "BLOCKXSIZE=16 BLOCKYSIZE=16 COMPRESS=LZ4";
+    {
+        const NativePointer poNew = CreateNative(fileName, options, 64, 16, {eDT_8U});
+        std::vector<unsigned char> oPixels(std::size_t{64} * 16, 7);
+        std::unique_ptr<krv::datasources::IRasterIO>(poNew->GetRasterIO({1}))
+            ->WriteWindow(0U, 0U, 48U, 16U, oPixels.data());
+        poNew->Close();
+    }
+    std::string bytes = ReadFile(fileName);
+    const auto Take = [&](std::vector<unsigned char>& oTile)
+    {
+        WriteAnew(fileName, bytes);
+        const NativePointer poFrom = OpenNative(fileName);
+        const NativePointer poTo = CreateNative(oFolder.File("copy.krv"), options, 64, 16, {eDT_8U});
+        const std::string error = Error(
+            [&] {
+                EXPECT_TRUE(poTo->TakeBlocks(1, *poFrom, {{0, 0, 0}, {0, 1, 0}, {0, 2, 0}, {0, 3, 0}}));
+            });
+        return error + (poTo->ReadEncoded(1, {0, 0, 0}, oTile) ? "+" : "-") +
+               (poTo->ReadEncoded(1, {0, 2, 0}, oTile) ? "+" : "-") +
+               (poTo->ReadEncoded(1, {0, 3, 0}, oTile) ? "+" : "-");
+    };
+    std::vector<unsigned char> oTile, oLast;
+    EXPECT_EQ(Take(oTile), "++-");
+    OpenNative(fileName)->ReadEncoded(1, {0, 2, 0}, oLast);
+    const std::string tile(oLast.begin(), oLast.end()); // all are alike
+    const std::size_t nSecond = bytes.find(tile, bytes.find(tile, Root::FIRST_PIECE) + tile.size());
+    ASSERT_NE(nSecond, std::string::npos);
+    bytes[nSecond + tile.size() / 2] ^= 1;
+    EXPECT_TRUE(Take(oTile).ends_with(", 0: is damaged: its checksum is wrong---"));
+}
+
 // The entry of one tile in the place of another's: the checksums are those of tiles, and both name one place.
 TEST(KrvdskHostile, TwoTilesInOnePlaceAreNotUpdated)
 {
@@ -188,7 +227,7 @@ TEST(KrvdskHostile, TwoTilesInOnePlaceAreNotUpdated)
     const auto Twice = [](std::string& directory, Root&)
     {
         const std::size_t nFirst = directory.find("Plan"), nSecond = directory.find("Plan", nFirst + 1);
-        const std::size_t nEntry = nSecond - nFirst - Entry::BYTES;
+        const std::size_t nEntry = nSecond - nFirst - Entry::BYTES - 1;
         directory.replace(nSecond + nEntry, 8, directory, nFirst + nEntry, 8);
     };
     const std::string twice = Replant(ReadFile(fileName), Twice);

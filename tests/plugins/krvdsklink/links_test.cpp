@@ -30,6 +30,7 @@
 #include <algorithm>
 #include <filesystem>
 #include <memory>
+#include <random>
 
 #include <gtest/gtest.h>
 
@@ -54,6 +55,11 @@ Facet& As(IDataset& oDataset)
 krv::gobs::DataType GetType(IRasterDataset& oRaster, unsigned int nChannel)
 {
     return std::unique_ptr<IChannelInfo>(oRaster.GetChannelInfo(nChannel))->GetDataType();
+}
+
+krv::gobs::DataType GetNativeType(IRasterDataset& oRaster, unsigned int nChannel)
+{
+    return std::unique_ptr<IChannelInfo>(oRaster.GetChannelInfo(nChannel))->GetNativeDataType();
 }
 
 // All pixels, in rows of blocks.
@@ -201,6 +207,7 @@ TEST_F(LinkTest, EveryRealFileIsSeenThroughItsLink)
         for (unsigned int nChannel = 1; nChannel <= oFrom.GetChanCount(); ++nChannel)
         {
             ASSERT_EQ(GetType(oTo, nChannel), oType);
+            EXPECT_EQ(GetNativeType(oTo, nChannel), GetNativeType(oFrom, nChannel));
             EXPECT_TRUE(ReadChannels(*poSource, {nChannel}) == ReadChannels(*poLink, {nChannel})) << nChannel;
         }
         EXPECT_EQ(poLink->ReadAuxiliaryData().GetFileMetadata(),
@@ -413,6 +420,109 @@ TEST_F(LinkTest, OverviewsOfALinkedFileAreItsOwn)
     As<IRasterDataset>(*poFewer).DeleteChannel(1);
     poFewer->Close();
     EXPECT_TRUE(std::unique_ptr<IOverviewManager>(As<IRasterDataset>(*Open(link)).GetOverviewManager())->IsValid(1, 2));
+}
+
+// Whatever the way from the link to the file whose pixels change, and until they are made anew.
+TEST_F(LinkTest, LevelsOfAnImageThatChangedAreOutdated)
+{
+    const std::string source = Make("scene.tif", "TIF", 301, 277, 1), link = File("scene.krv"), far = File("far.krv");
+    Link(link, source);
+    Link(far, link);
+    const auto Build = [](const std::string& file, bool bAdd)
+    {
+        const DatasetPtr poDataset = Open(file, eUpdate);
+        if (bAdd)
+            As<IRasterDataset>(*poDataset).AddNewChannel({301, 277, 1, krv::gobs::eDT_8U});
+        BasicWriter oWriter(&As<IRasterDataset>(*poDataset), {1});
+        EXPECT_TRUE(BuildOverviews(oWriter, {2, 4}, "average"));
+        BasicWriter oOther(&As<IRasterDataset>(*poDataset), {2});
+        EXPECT_TRUE(BuildOverviews(oOther, {2, 4}, "average"));
+        poDataset->Close();
+    };
+    const auto AreValid = [](const std::string& file, unsigned int nChannel)
+    {
+        const DatasetPtr poDataset = Open(file);
+        const std::unique_ptr<IOverviewManager> poLevels(As<IRasterDataset>(*poDataset).GetOverviewManager());
+        EXPECT_EQ(poLevels->GetLevels(), (Numbers{2, 4}));
+        EXPECT_EQ(poLevels->IsValid(nChannel, 2), poLevels->IsValid(nChannel, 4));
+        return poLevels->IsValid(nChannel, 4);
+    };
+    Build(far, true); // while the file that it leads to has none
+    Build(link, true);
+    EXPECT_TRUE(AreValid(link, 1) && AreValid(far, 2));
+    Build(far, false); // its link became longer
+    EXPECT_TRUE(AreValid(far, 1));
+    {
+        const DatasetPtr poSource = Open(source, eUpdate);
+        Fill(*poSource, 1, 200);
+        poSource->Close();
+    }
+    for (const std::string& file : {link, far})
+    {
+        EXPECT_FALSE(AreValid(file, 1)) << file;
+        EXPECT_TRUE(AreValid(file, 2)) << file;
+    }
+    Build(link, false);
+    EXPECT_TRUE(AreValid(link, 1));
+    EXPECT_FALSE(AreValid(far, 1));
+    std::filesystem::remove(source); // the levels are what is left of it
+    EXPECT_TRUE(AreValid(link, 1));
+}
+
+// Of a link with levels and a channel of its own.
+TEST_F(LinkTest, DamageIsFoundOrDoesNoHarm)
+{
+    const std::string source = Make("scene.tif", "TIF", 90, 70, 2), link = File("scene.krv");
+    Link(link, source);
+    {
+        const DatasetPtr poLink = Open(link, eUpdate);
+        As<IRasterDataset>(*poLink).AddNewChannel({90, 70, 1, krv::gobs::eDT_8U});
+        Fill(*poLink, 3, 9);
+        BasicWriter oWriter(&As<IRasterDataset>(*poLink), {1, 2, 3});
+        EXPECT_TRUE(BuildOverviews(oWriter, {2}, "average"));
+        poLink->Close();
+    }
+    const auto Tell = [&](AccessMode eMode)
+    {
+        std::string told;
+        const std::string error = Error([&] { told = TellDataset(*Open(link, eMode)); });
+        return error.empty() ? told : "refused: " + error;
+    };
+    const auto Write = [&](const std::string& bytes)
+    {
+        std::filesystem::remove(link);
+        krv::conformance::WriteFile(link, bytes);
+    };
+    const std::string last = krv::conformance::ReadFile(link), told = Tell(eReadOnly);
+    // Without the state before, which would be the file's instead.
+    std::string whole;
+    for (const std::size_t nRoot : {std::size_t{4096}, std::size_t{8192}})
+    {
+        const std::string one = std::string(last).replace(nRoot, 512, 512, '\0');
+        Write(one);
+        if (Tell(eReadOnly) == told)
+            whole = one;
+    }
+    ASSERT_FALSE(whole.empty());
+    std::mt19937 oRandom(8);
+    int nRefused = 0;
+    for (int nTime = 0; nTime < 2000; ++nTime)
+    {
+        std::string damaged = whole;
+        // Without its first bytes no format knows the file.
+        const std::size_t nAt = 12 + oRandom() % (whole.size() - 12);
+        const std::size_t nEnd = std::min(nAt + 1 + oRandom() % 40, whole.size());
+        for (std::size_t nByte = nAt; nByte < nEnd; ++nByte)
+            damaged[nByte] = static_cast<char>(oRandom());
+        if (nTime % 4 == 0)
+            damaged.resize(nAt);
+        Write(damaged);
+        const std::string got = Tell(nTime % 2 == 0 ? eReadOnly : eUpdate);
+        const bool bRefused = got.starts_with("refused: ");
+        ASSERT_TRUE(bRefused ? got.find(link) != std::string::npos : got == told) << nAt << "\n" << got;
+        nRefused += bRefused;
+    }
+    EXPECT_GT(nRefused, 500);
 }
 
 TEST_F(LinkTest, SegmentsOfTheSourceKeepTheirNumbers)
