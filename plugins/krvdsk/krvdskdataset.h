@@ -60,6 +60,8 @@ public:
     // After both of these, I/O objects made before are of no more use.
     void AddNewChannel(const krv::gobs::RasterInfo& oInfo) override;
     void DeleteChannel(unsigned int nChannel) override;
+    // Levels that the other file's changes made outdated are told as such.
+    krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
     // Of a linked channel as the other file has it stored, while that can be had.
     krv::datasources::IChannelInfo* GetChannelInfo(unsigned int nChannel) const override;
     krv::datasources::IHistoryIO* GetHistoryIO(unsigned int nChannel) override;

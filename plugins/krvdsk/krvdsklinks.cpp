@@ -1,4 +1,5 @@
 // The channels of a native file that lie in another one, and what is seen of that file.
+#include "datasources/metadata/levelbook.h"
 #include "plugins/krvdsk/krvdskdataset.h"
 #include "plugins/krvdsk/link/linkedio.h"
 #include "plugins/krvdsk/link/linkedlevels.h"
@@ -171,6 +172,16 @@ bool KrvdskDataset::IsOutdated(unsigned int nChannel, unsigned int nLevel) const
     const auto oFound = oMadeOf.find(nLevel);
     const auto oNow = oFound == oMadeOf.end() || !mpoLink ? std::nullopt : mpoLink->FindState();
     return oNow && *oNow != oFound->second;
+}
+
+krv::datasources::AuxiliaryData KrvdskDataset::ReadAuxiliaryData()
+{
+    krv::datasources::AuxiliaryData oTags = RecordDataset::ReadAuxiliaryData();
+    for (unsigned int nChannel = 1; nChannel <= GetCatalogue().moLinked.size(); ++nChannel)
+        for (const auto& [nLevel, oSize] : GetCatalogue().moLevels)
+            if (IsLevelValid(oTags, nChannel, nLevel) && IsOutdated(nChannel, nLevel))
+                SetLevelValid(oTags, nChannel, nLevel, false, {});
+    return oTags;
 }
 
 void KrvdskDataset::NoteMadeOf(unsigned int nChannel, unsigned int nLevel)

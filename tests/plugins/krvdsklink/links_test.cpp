@@ -13,6 +13,7 @@
 #include "datasources/interfaces/iverifieddataset.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
+#include "datasources/metadata/levelbook.h"
 #include "datasources/overviews/overviewbuilder.h"
 #include "datasources/utils/createlinkedpix.h"
 #include "datasources/utils/loadmathmodel.h"
@@ -445,6 +446,7 @@ TEST_F(LinkTest, LevelsOfAnImageThatChangedAreOutdated)
         const std::unique_ptr<IOverviewManager> poLevels(As<IRasterDataset>(*poDataset).GetOverviewManager());
         EXPECT_EQ(poLevels->GetLevels(), (Numbers{2, 4}));
         EXPECT_EQ(poLevels->IsValid(nChannel, 2), poLevels->IsValid(nChannel, 4));
+        EXPECT_EQ(poLevels->IsValid(nChannel, 4), IsLevelValid(poDataset->ReadAuxiliaryData(), nChannel, 4));
         return poLevels->IsValid(nChannel, 4);
     };
     Build(far, true); // while the file that it leads to has none
