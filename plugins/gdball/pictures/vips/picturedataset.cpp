@@ -26,6 +26,8 @@ void DescribeChannels(VipsInterpretation eMeaning, AuxiliaryData& oTags)
                           eMeaning == VIPS_INTERPRETATION_scRGB;
     const bool bGrey = eMeaning == VIPS_INTERPRETATION_B_W || eMeaning == VIPS_INTERPRETATION_GREY16;
     const unsigned int nColours = bColours ? 3 : bGrey ? 1 : 0;
+    if (eMeaning == VIPS_INTERPRETATION_CMYK)
+        oTags.SetFileMetadataValue("Photometric", "Separated");
     for (unsigned int nAt = 0; nAt < std::min(nColours, oTags.GetChannelCount()); ++nAt)
         oTags.SetChanMetadataValue(INTERPRETATION, bColours ? COLOURS[nAt] : "Gray", nAt + 1);
     if (nColours != 0 && oTags.GetChannelCount() == nColours + 1)
