@@ -89,6 +89,8 @@ Decoder::Decoder(Picture& oPicture) : moPicture(oPicture)
         throw FileFormatException(oPicture.mpoFile->GetName(),
                                   oPicture.mpoFile->GetName() + ": a " + GetPictureName(oPicture.meKind) +
                                       " file of more than " + std::to_string(MOST_WHOLE >> 20) + " MiB is not read");
+    if (oPicture.mnPage != 1)
+        CheckPage();
     Listener oListener(oPicture.mpoFile->GetName(), oPicture.moSaid);
     const std::string trouble = std::string("the ") + GetPictureName(oPicture.meKind) + " picture cannot be opened";
     mpoOperation.reset(NewLoader(oPicture.meKind));
@@ -106,8 +108,6 @@ Decoder::Decoder(Picture& oPicture) : moPicture(oPicture)
     g_object_set(pOperation, "access", VIPS_ACCESS_SEQUENTIAL, "fail_on", eFail, nullptr);
     if (HasPages(oPicture.meKind))
         g_object_set(pOperation, "page", static_cast<int>(oPicture.mnPage) - 1, nullptr);
-    else if (oPicture.mnPage != 1)
-        RefusePage(1);
     g_signal_connect(pOperation, "invalidate", G_CALLBACK(OnTrouble), this);
     // Not by the cache of operations, whoever set that up.
     const bool bBuilt = vips_object_build(VIPS_OBJECT(pOperation)) == 0;
@@ -116,8 +116,6 @@ Decoder::Decoder(Picture& oPicture) : moPicture(oPicture)
         g_object_get(pOperation, "out", &pImage, nullptr);
     mpoImage.reset(pImage);
     vips_object_unref_outputs(VIPS_OBJECT(pOperation));
-    if (!bBuilt && !moError && oPicture.mnPage != 1)
-        CheckPage();
     if (!bBuilt || moError || mbTrouble)
         Fail(oListener, trouble);
     if (pImage->Coding == VIPS_CODING_RAD)
@@ -153,17 +151,12 @@ void Decoder::CheckPage() const
 {
     Picture oFirst = moPicture;
     oFirst.mnPage = 1;
-    const Decoder oDecoder(oFirst);
-    const int nPages = vips_image_get_n_pages(&oDecoder.GetImage());
-    if (nPages >= 1 && static_cast<unsigned int>(nPages) < moPicture.mnPage)
-        RefusePage(nPages);
-}
-
-void Decoder::RefusePage(int nPages) const
-{
     const std::string& name = moPicture.mpoFile->GetName();
-    throw DataException(name + ": there is no page " + std::to_string(moPicture.mnPage) + "; the last one is " +
-                        std::to_string(nPages));
+    const Decoder oDecoder(oFirst);
+    const int nPages = HasPages(moPicture.meKind) ? vips_image_get_n_pages(&oDecoder.GetImage()) : 1;
+    if (static_cast<unsigned int>(nPages) < moPicture.mnPage)
+        throw DataException(name + ": there is no page " + std::to_string(moPicture.mnPage) + "; the last one is " +
+                            std::to_string(nPages));
 }
 
 void Decoder::CheckMemory() const
@@ -207,9 +200,9 @@ void Decoder::Read(unsigned int nRows, unsigned char* pTarget, std::size_t nPitc
         const Owned<VipsImage> poTarget(
             vips_image_new_from_memory(pTarget, std::size_t{nStep} * static_cast<std::size_t>(nWidth) * nPixel, nWidth,
                                        static_cast<int>(nStep), mpoImage->Bands, mpoImage->BandFmt));
-        const Owned<VipsRegion> poRegion(vips_region_new(poTarget.get()));
+        const Owned<VipsRegion> poRegion(poTarget ? vips_region_new(poTarget.get()) : nullptr);
         const VipsRect oRect = {0, 0, mpoImage->Xsize, static_cast<int>(nStep)};
-        if (vips_region_image(poRegion.get(), &oRect) != 0)
+        if (!poRegion || vips_region_image(poRegion.get(), &oRect) != 0)
             throw std::bad_alloc();
         Prepare(nStep, poRegion.get());
     }

@@ -50,7 +50,6 @@ public:
 private:
     // Throws DataException when the picture does not have the page.
     void CheckPage() const;
-    [[noreturn]] void RefusePage(int nPages) const;
     void CheckMemory() const;
     // Decodes the next rows, into the target when there is one.
     void Prepare(unsigned int nRows, VipsRegion* pTarget);
