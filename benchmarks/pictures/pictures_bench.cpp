@@ -116,7 +116,8 @@ int main(int nArguments, char** pArguments)
                                                            {
                                                                ReadTiles(file);
                                                            }}},
-                                                         static_cast<int>(oArguments.GetNumber("rounds", 5)));
+                                                         static_cast<int>(oArguments.GetNumber("rounds", 5)),
+                                                         Clock::eProcessor);
         PrintRow(std::string("whole ") + pType, oTimes[0] / oTimes[1], 0.95,
                  Number(1e-6 * nSize * nSize / oTimes[1], 1) + " million pixels a second");
     }

@@ -54,11 +54,11 @@ bool HoldsLevels(IDataset& oDataset)
     return std::unique_ptr<IOverviewManager>(poRaster->GetOverviewManager()) != nullptr;
 }
 
-// "name[page=2]": a page of an animation or a book of pictures.
+// "name[page=2]": a page of an animation or a book of pictures, unless a file has that very name.
 struct PictureName
 {
     std::string moFile;
-    unsigned int mnPage = 1;
+    unsigned int mnPage = 0; // none is named
 
     explicit PictureName(const std::string& name) : moFile(name)
     {
@@ -134,9 +134,10 @@ GdballBuilder::GdballBuilder() : Builder(Describe(), ListExtensions(), NAME)
 
 GdballBuilder::~GdballBuilder() = default;
 
-int GdballBuilder::Identify(const std::string&, const unsigned char* pHeader, unsigned int nHeaderLength, int)
+int GdballBuilder::Identify(const std::string& fileName, const unsigned char* pHeader, unsigned int nHeaderLength, int)
 {
-    return HasPictures() && FindPictureKind(pHeader, nHeaderLength) ? 0 : 1;
+    const bool bPicture = FindPictureKind(pHeader, nHeaderLength) || PictureName(fileName).mnPage != 0;
+    return HasPictures() && bPicture ? 0 : 1;
 }
 
 std::unique_ptr<IDataset> GdballBuilder::OpenImage(const std::string& fileName, AccessMode eMode)
@@ -145,7 +146,8 @@ std::unique_ptr<IDataset> GdballBuilder::OpenImage(const std::string& fileName, 
     if (HasPictures())
         if (const auto oKind = FindKind(oName.moFile))
             return std::unique_ptr<IDataset>(
-                GetPictureModule(oName.moFile).mpOpen(oName.moFile, *oKind, oName.mnPage, GetFileFormat()));
+                GetPictureModule(oName.moFile)
+                    .mpOpen(oName.moFile, *oKind, std::max(1u, oName.mnPage), GetFileFormat()));
     return OpenByManager(fileName, eMode);
 }
 
@@ -156,6 +158,9 @@ bool GdballBuilder::IsPicture(const std::string& fileName)
 
 IDataset* GdballBuilder::Open(const std::string& fileName, AccessMode eMode)
 {
+    const PictureName oName(fileName);
+    if (oName.mnPage == 1)
+        return Open(oName.moFile, eMode);
     if (auto poShared = SharedImage::Find(fileName, eMode))
         return new GenericDataset(std::move(poShared));
     const bool bLevels = !support::FindAppended(fileName, ".ovr").empty();
@@ -166,6 +171,8 @@ IDataset* GdballBuilder::Open(const std::string& fileName, AccessMode eMode)
     {
         throw FileFormatException(fileName, fileName + ": " + pWhy);
     };
+    if (oName.mnPage != 0 && !bPicture)
+        throw DataException(oName.moFile + ": has no pages: it is no picture");
     if ((!bLevels && eMode != eUpdate) || krv::ToUpper(fileName).ends_with(".OVR"))
         Refuse("is no picture, and no levels lie beside it");
     std::unique_ptr<IDataset> poImage = OpenImage(fileName, eMode);

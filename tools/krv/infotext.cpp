@@ -205,7 +205,9 @@ std::string InfoText(const Json& oInfo)
     for (const Json& oSidecar : oInfo["sidecars"])
         text += SidecarText(oSidecar);
     if (oInfo["furtherImages"].is_number() && oInfo["furtherImages"] != 0)
-        text += Line("further", oInfo["furtherImages"].dump() + " images behind this one, which are not shown");
+        text +=
+            Line("further", oInfo["furtherImages"].dump() + " images behind this one, which are not shown" +
+                                (oInfo["format"] == "GDBALL" ? "; \"FILE[page=N]\" is the one of that number" : ""));
     text += "  channels\n";
     for (const Json& oChannel : oInfo["channels"])
         text += ChannelText(oChannel);

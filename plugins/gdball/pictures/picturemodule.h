@@ -13,8 +13,8 @@ namespace krv::plugins::gdball
 // first, so that no program pays for libvips that meets none.
 struct PictureModule
 {
-    // nPage: of an animation or a book, from 1. poFormat: kept as a pointer. Throw what IFileIOBuilder's operations
-    // throw.
+    // nPage: of an animation or a book, from 1; the dataset of a later one is called "name[page=2]". poFormat: kept as
+    // a pointer. Throw what IFileIOBuilder's operations throw.
     krv::datasources::IDataset* (*mpOpen)(const std::string& fileName, PictureKind eKind, unsigned int nPage,
                                           krv::datasources::IFileFormat* poFormat);
     krv::datasources::IDataset* (*mpCreate)(const std::string& fileName, PictureKind eKind, const std::string& options,

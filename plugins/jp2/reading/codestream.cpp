@@ -48,6 +48,8 @@ constexpr std::size_t READ_BYTES = 4096;
 constexpr double CODE_BLOCK_BYTES = 700;
 constexpr double PRECINCT_BYTES = 300;
 constexpr double PACKET_BYTES = 2;
+// Each packet has a byte at least. Where so many lack theirs, looking for them takes longer than decoding.
+constexpr double MOST_MISSING = 1 << 18;
 
 unsigned int GetExponent(const Coding& oCoding, unsigned int nResolution, unsigned int nShift)
 {
@@ -471,9 +473,13 @@ std::vector<Codestream::Piece> Codestream::CutOut(const TileRange& oTiles, std::
                 return nSum + oPart.mnBytes;
             };
             const std::uint64_t nData = std::accumulate(oParts.begin(), oParts.end(), std::uint64_t{0}, AddBytes);
-            if (EstimateMemory(nTile, oParts) > static_cast<double>(nMemory + 2 * nData))
+            const Structure oStructure = FindStructure(nTile, oParts);
+            if (oStructure.mnMemory > static_cast<double>(nMemory + 2 * nData))
                 Fail("tile " + std::to_string(nTile) + " is cut into so many code-blocks or packets that decoding it " +
                      "takes more than " + std::to_string(nMemory >> 20) + " MiB");
+            if (moPackedParts.empty() && oStructure.mnPackets > static_cast<double>(nData) + MOST_MISSING)
+                Fail("tile " + std::to_string(nTile) + " is not whole: it has " + std::to_string(nData) +
+                     " bytes, and says to have more packets");
         }
     oPieces.front().moBytes = MakeMainHeader(oTiles, oNumbers);
     oPieces.emplace_back();
@@ -482,7 +488,7 @@ std::vector<Codestream::Piece> Codestream::CutOut(const TileRange& oTiles, std::
 }
 
 // Headers of a tile may say otherwise than the main header.
-double Codestream::EstimateMemory(std::uint32_t nTile, const std::vector<TilePart>& oParts) const
+Codestream::Structure Codestream::FindStructure(std::uint32_t nTile, const std::vector<TilePart>& oParts) const
 {
     std::optional<Coding> oTileCoding;
     std::map<std::size_t, Coding> oTileCodings;
@@ -511,7 +517,7 @@ double Codestream::EstimateMemory(std::uint32_t nTile, const std::vector<TilePar
     }
     const std::uint32_t nColumn = nTile % mnTilesAcross, nRow = nTile / mnTilesAcross;
     const GridRect oRect = GetRect({nColumn, nRow, nColumn, nRow});
-    double nBytes = 0, nMostPrecincts = 0, nMostResolutions = 0;
+    double nBytes = 0, nAllPrecincts = 0, nMostPrecincts = 0, nMostResolutions = 0;
     for (std::size_t nAt = 0; nAt < moComponents.size(); ++nAt)
     {
         const auto oOwn = oTileCodings.find(nAt);
@@ -536,10 +542,11 @@ double Codestream::EstimateMemory(std::uint32_t nTile, const std::vector<TilePar
                            std::min(oCoding.mnBlockHeight, nDown - std::min(nBand, nDown)));
             nBytes += (nBand == 0 ? 1 : 3) * (nBlocks * CODE_BLOCK_BYTES + nPrecincts * PRECINCT_BYTES);
             nMostPrecincts = std::max(nMostPrecincts, nPrecincts);
+            nAllPrecincts += nPrecincts;
         }
     }
-    return nBytes +
-           nLayers * nMostResolutions * static_cast<double>(moComponents.size()) * nMostPrecincts * PACKET_BYTES;
+    nBytes += nLayers * nMostResolutions * static_cast<double>(moComponents.size()) * nMostPrecincts * PACKET_BYTES;
+    return {nBytes, nLayers * nAllPrecincts};
 }
 
 } // namespace krv::plugins::jp2

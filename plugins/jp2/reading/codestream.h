@@ -138,7 +138,13 @@ private:
     bool HasSamples(std::uint32_t nTile) const;
     std::vector<unsigned char> MakeMainHeader(const TileRange& oTiles, const std::vector<std::uint32_t>& oParts) const;
     void AppendPackedHeaders(std::vector<unsigned char>& oBytes, const std::vector<std::uint32_t>& oParts) const;
-    double EstimateMemory(std::uint32_t nTile, const std::vector<TilePart>& oParts) const;
+    // What decoding a tile takes beside its pixels, roughly.
+    struct Structure
+    {
+        double mnMemory = 0; // bytes
+        double mnPackets = 0;
+    };
+    Structure FindStructure(std::uint32_t nTile, const std::vector<TilePart>& oParts) const;
 
     std::shared_ptr<support::File> mpoFile;
     std::uint64_t mnEnd;

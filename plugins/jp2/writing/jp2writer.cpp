@@ -3,6 +3,7 @@
 #include "plugins/jp2/geo/geoboxes.h"
 #include "plugins/jp2/geo/geotiffbox.h"
 #include "plugins/jp2/recordbox.h"
+#include "plugins/support/file/copypieces.h"
 #include "plugins/support/file/numbers.h"
 #include "toolkit/core/lettercase.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -21,7 +22,6 @@ using support::AppendNumber;
 constexpr std::uint64_t MOST_TILES = 65535;
 constexpr unsigned int MOST_CHANNELS = 16384;
 constexpr std::uint64_t LARGEST_TILE_BYTES = std::uint64_t{512} << 20; // of samples as the encoder takes them
-constexpr std::size_t COPY_BYTES = std::size_t{1} << 20;
 
 void AppendBox(Bytes& oBytes, std::string_view type, const Bytes& oContent)
 {
@@ -167,11 +167,7 @@ bool Jp2Writer::HasBoxes() const
 void Jp2Writer::Store()
 {
     mpoTiles->Complete();
-    support::NewFile oNew(GetFileName(), TakesPlace());
-    WriteAll(*oNew.GetFile());
-    oNew.GetFile()->Flush();
-    TakeName(oNew);
-    SetNamed();
+    StoreAnew([this](support::File& oFile) { WriteAll(oFile); });
     mbChanged = false;
 }
 
@@ -192,21 +188,21 @@ void Jp2Writer::WriteAll(support::File& oFile) const
     oHead.insert(oHead.end(), oMain.begin(), oMain.end());
     oFile.Write(0, oHead.data(), oHead.size());
     std::uint64_t nPlace = oHead.size();
-    Bytes oBuffer;
+    std::vector<support::CopiedPiece> oData;
     for (std::uint64_t nTile = 0; nTile < mpoTiles->CountTiles(); ++nTile)
-        for (std::uint64_t nDone = 0; nDone < mpoTiles->GetTileBytes(nTile); nDone += oBuffer.size())
-        {
-            oBuffer.resize(
-                static_cast<std::size_t>(std::min<std::uint64_t>(COPY_BYTES, mpoTiles->GetTileBytes(nTile) - nDone)));
-            GetFile()->Read(mpoTiles->GetTileOffset(nTile) + nDone, oBuffer.data(), oBuffer.size());
-            if (nDone == 0)
-            {
-                oBuffer[4] = static_cast<unsigned char>(nTile >> 8);
-                oBuffer[5] = static_cast<unsigned char>(nTile);
-            }
-            oFile.Write(nPlace, oBuffer.data(), oBuffer.size());
-            nPlace += oBuffer.size();
-        }
+    {
+        oData.push_back({mpoTiles->GetTileOffset(nTile), nPlace, mpoTiles->GetTileBytes(nTile)});
+        nPlace += oData.back().mnBytes;
+    }
+    support::Scratch oScratch;
+    support::CopyPieces(*GetFile(), oFile, oData, oScratch);
+    // Each was encoded as the first one of a codestream of its own.
+    for (std::size_t nTile = 1; nTile < oData.size(); ++nTile)
+    {
+        constexpr std::uint64_t NUMBER = 4;
+        const Bytes oNumber = Numbers({{nTile, 2}});
+        oFile.Write(oData[nTile].mnTo + NUMBER, oNumber.data(), oNumber.size());
+    }
     const Bytes oEnd = Numbers({{EOC, 2}});
     oFile.Write(nPlace, oEnd.data(), oEnd.size());
 }

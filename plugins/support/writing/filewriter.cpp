@@ -45,10 +45,12 @@ void FileWriter::RemoveFile() noexcept
     mpoNew.reset();
 }
 
-void FileWriter::SetNamed()
+void FileWriter::StoreAnew(const std::function<void(File&)>& oWrite)
 {
-    mpoNew.reset();
-    mbNamed = true;
+    NewFile oNew(moFileName, TakesPlace());
+    oWrite(*oNew.GetFile());
+    oNew.GetFile()->Flush();
+    TakeName(oNew);
 }
 
 void FileWriter::Synchronize()
@@ -64,16 +66,17 @@ void FileWriter::Synchronize()
 void FileWriter::GiveName()
 {
     TakeName(*mpoNew);
-    SetNamed();
 }
 
-void FileWriter::TakeName(NewFile& oNew) const
+void FileWriter::TakeName(NewFile& oNew)
 {
     struct stat oStatus = {};
     const bool bTaken = !TakesPlace() && ::lstat(moFileName.c_str(), &oStatus) == 0; // which is told below
     SetAside oOld(mbNamed || bTaken ? std::vector<std::string>() : ListCompanions(moFileName));
     oNew.TakeName(TakesPlace());
     oOld.Drop();
+    mpoNew.reset();
+    mbNamed = true;
 }
 
 void FileWriter::Finish()

@@ -3,6 +3,7 @@
 #include "plugins/support/file/file.h"
 #include "plugins/support/writing/newfile.h"
 
+#include <functional>
 #include <memory>
 #include <string>
 
@@ -50,9 +51,9 @@ protected:
     virtual bool HoldsChanges() const = 0;
     // Gives a new file that is whole its name.
     virtual void GiveName();
-    // Gives one that takes the place of this file, or of an older one of the name, that name. The levels, masks and
-    // tags that lie beside the name of an older one go with it: they would be taken for this one's.
-    void TakeName(NewFile& oNew) const;
+    // For a format that makes its file anew each time: oWrite fills a new one, which is flushed and takes the name.
+    // What GetFile gives stays.
+    void StoreAnew(const std::function<void(File&)>& oWrite);
 
     void MakeFile();
     // In place of it: a file without a name for what is written, in the folder of scratch files, of which Store makes
@@ -62,12 +63,14 @@ protected:
     void RemoveFile() noexcept;
     // Ends writing, without storing anything.
     void End();
-    // Whether a file of the name gives way to this one.
-    bool TakesPlace() const { return mbNamed || mbReplaces; }
-    // What was made has its name, or what took its place.
-    void SetNamed();
 
 private:
+    // Whether a file of the name gives way to this one.
+    bool TakesPlace() const { return mbNamed || mbReplaces; }
+    // Gives one that takes the place of this file, or of an older one of the name, that name. The levels, masks and
+    // tags that lie beside the name of an older one go with it: they would be taken for this one's.
+    void TakeName(NewFile& oNew);
+
     std::string moFileName;
     std::shared_ptr<File> mpoFile;
     std::unique_ptr<NewFile> mpoNew; // until it has its name

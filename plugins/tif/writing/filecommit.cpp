@@ -323,11 +323,8 @@ void FileEditor::Finish()
     // Only the file that has got the name is replaced by its better form.
     if (IsNamed())
         GetFile()->Flush();
-    support::NewFile oLaidOut(GetFileName(), TakesPlace());
-    WriteCloudLayout(moPages, moHeader, *GetFile(), *oLaidOut.GetFile(), moOptions.mbCloud);
-    oLaidOut.GetFile()->Flush();
-    TakeName(oLaidOut);
-    SetNamed();
+    StoreAnew([this](support::File& oLaidOut)
+              { WriteCloudLayout(moPages, moHeader, *GetFile(), oLaidOut, moOptions.mbCloud); });
     End();
 }
 

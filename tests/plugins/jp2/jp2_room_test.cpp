@@ -370,6 +370,7 @@ TEST(Jp2Room, HostileHeadersAreRefusedBeforeMemoryIsTaken)
         {42, 1, 60, "bits"},
         {43, 1, 0, "no samples"},
         {4, 2, 3, ""},
+        {nCod + 6, 2, 65535, "more packets"},
         {nCod + 9, 1, 40, "out of range"},
         {nCod + 10, 1, 11, "out of range"},
         {nCod + 2, 2, 1, "no valid length"},

@@ -392,8 +392,7 @@ TEST(Pictures, FactsBesideThePixelsAreTold)
     EXPECT_TRUE(dynamic_cast<IGeocodedDataset&>(*poFirst).GetGeocoding() == oPlace);
     const auto OpenPage = [&](const std::string& page)
     {
-        return std::unique_ptr<IDataset>(
-            DatasetManager::GetInstance()->OpenFormat("GDBALL", file + "[page=" + page + "]", eReadOnly));
+        return Open(file + "[page=" + page + "]");
     };
     const auto Pixels = [](IDataset& oDataset)
     {
@@ -404,5 +403,11 @@ TEST(Pictures, FactsBesideThePixelsAreTold)
     };
     EXPECT_TRUE(Pixels(*OpenPage("1")) == Pixels(*poFirst));
     EXPECT_FALSE(Pixels(*OpenPage("2")) == Pixels(*poFirst));
-    EXPECT_EQ(OpenPage("6"), nullptr);
+    EXPECT_TRUE(dynamic_cast<IGeocodedDataset&>(*OpenPage("5")).GetGeocoding() == oPlace);
+    EXPECT_EQ(dynamic_cast<IPagedDataset&>(*OpenPage("3")).CountFurtherImages(), 2u);
+    EXPECT_NE(krv::test::Error([&] { OpenPage("6"); }).find("there is no page 6; the last one is 5"),
+              std::string::npos);
+    EXPECT_NE(krv::test::Error([&] { Open(oFolder.File("none.gif[page=2]")); }).find("none.gif"), std::string::npos);
+    krv::conformance::WriteFile(file + "[page=2]", ReadFile(folder + "gif/hopper.gif"));
+    EXPECT_EQ(dynamic_cast<IRasterDataset&>(*OpenPage("2")).GetWidth(), 128u) << "a file of that very name";
 }

@@ -7,6 +7,7 @@
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
+#include <span>
 #include <vector>
 
 namespace krv::plugins::gdball
@@ -127,25 +128,77 @@ Claims ReadPnmClaims(const File& oFile)
     return oClaims;
 }
 
+// The bytes of a file one after the other, read in pieces that stay in the processor's cache.
+class Sequence
+{
+public:
+    Sequence(const File& oFile, std::uint64_t nBegin)
+        : moFile(oFile), mnPlace(nBegin),
+          moPiece(static_cast<std::size_t>(std::min<std::uint64_t>(PIECE, oFile.GetSize())))
+    {
+    }
+
+    // Of the next byte.
+    std::uint64_t GetPlace() const { return mnPlace - (mnHeld - mnUsed); }
+
+    // Some of the next bytes, at most so many; none at the end of the file.
+    std::span<const unsigned char> Next(std::uint64_t nMost)
+    {
+        if (mnUsed == mnHeld)
+        {
+            mnHeld = moFile.ReadUpTo(mnPlace, moPiece.data(), moPiece.size());
+            mnPlace += mnHeld;
+            mnUsed = 0;
+        }
+        const auto nBytes = static_cast<std::size_t>(std::min<std::uint64_t>(nMost, mnHeld - mnUsed));
+        mnUsed += nBytes;
+        return {moPiece.data() + mnUsed - nBytes, nBytes};
+    }
+
+    // So many bytes; false when the file ends before.
+    bool Take(unsigned char* pTarget, std::size_t nBytes)
+    {
+        for (std::size_t nDone = 0; nDone < nBytes;)
+        {
+            const auto oBytes = Next(nBytes - nDone);
+            if (oBytes.empty())
+                return false;
+            std::copy(oBytes.begin(), oBytes.end(), pTarget + nDone);
+            nDone += oBytes.size();
+        }
+        return true;
+    }
+
+private:
+    static constexpr std::size_t PIECE = std::size_t{1} << 18;
+
+    const File& moFile;
+    std::uint64_t mnPlace; // behind what is held
+    std::size_t mnHeld = 0, mnUsed = 0;
+    std::vector<unsigned char> moPiece;
+};
+
 // Numbers between blanks. libvips takes bits of PBM that stand without any, as they may, for one large number.
 void CheckText(const File& oFile, const PnmHeader& oHeader)
 {
-    constexpr std::size_t PIECE = std::size_t{1} << 20;
     const std::uint64_t nSamples = oHeader.mnWidth * oHeader.mnHeight * oHeader.GetChannels();
     const std::uint32_t nMost = oHeader.IsBits() ? 1 : ParseNumber<std::uint32_t>(oHeader.moMaximum).value_or(0);
-    std::vector<unsigned char> oPiece(std::min<std::size_t>(PIECE, static_cast<std::size_t>(oFile.GetSize())));
+    Sequence oSequence(oFile, oHeader.mnBytes);
     std::uint64_t nFound = 0;
     std::uint32_t nValue = 0;
     bool bInside = false;
-    for (std::uint64_t nAt = oHeader.mnBytes; nFound < nSamples || bInside; nAt += oPiece.size())
+    while (nFound < nSamples || bInside)
     {
-        const std::size_t nRead = oFile.ReadUpTo(nAt, oPiece.data(), oPiece.size());
-        for (std::size_t nByte = 0; nByte < nRead && (nFound < nSamples || bInside); ++nByte)
+        std::uint64_t nAt = oSequence.GetPlace();
+        const auto oBytes = oSequence.Next(UINT64_MAX);
+        if (oBytes.empty())
+            break;
+        for (auto oByte = oBytes.begin(); oByte != oBytes.end() && (nFound < nSamples || bInside); ++oByte, ++nAt)
         {
-            const unsigned char nLetter = oPiece[nByte];
+            const unsigned char nLetter = *oByte;
             const bool bDigit = nLetter >= '0' && nLetter <= '9';
             if (!bDigit && nLetter != ' ' && (nLetter < '\t' || nLetter > '\r'))
-                Refuse(oFile, "byte " + std::to_string(nAt + nByte) + " is no part of a sample");
+                Refuse(oFile, "byte " + std::to_string(nAt) + " is no part of a sample");
             const bool bNew = bDigit && !bInside;
             nValue = bNew ? nLetter - '0' : bDigit ? std::min(nValue * 10 + (nLetter - '0'), 99999u) : nValue;
             nFound += bNew ? 1 : 0;
@@ -153,10 +206,8 @@ void CheckText(const File& oFile, const PnmHeader& oHeader)
                 Refuse(oFile, "bits without blanks between them are not read");
             bInside = bDigit;
             if (bDigit && nValue > nMost)
-                Refuse(oFile, "the sample at byte " + std::to_string(nAt + nByte) + " is larger than the maximum");
+                Refuse(oFile, "the sample at byte " + std::to_string(nAt) + " is larger than the maximum");
         }
-        if (nRead < oPiece.size())
-            break;
     }
     if (nFound < nSamples)
         Refuse(oFile, "the file is cut off: it has " + std::to_string(nFound) + " of " + std::to_string(nSamples) +
@@ -168,33 +219,31 @@ void CheckPng(const File& oFile)
     constexpr std::uint64_t SIGNATURE = 8;
     constexpr std::uint64_t END = 0x49454E44;          // IEND
     constexpr std::uint64_t TRANSPARENCY = 0x74524E53; // tRNS
-    constexpr std::size_t PIECE = std::size_t{1} << 20;
-    std::vector<unsigned char> oPiece(std::min<std::size_t>(PIECE, static_cast<std::size_t>(oFile.GetSize())));
-    for (std::uint64_t nAt = SIGNATURE;;)
+    Sequence oSequence(oFile, SIGNATURE);
+    for (std::uint64_t nType = 0; nType != END;)
     {
+        const std::uint64_t nAt = oSequence.GetPlace();
         unsigned char aHead[8];
-        if (oFile.ReadUpTo(nAt, aHead, 8) != 8)
+        if (!oSequence.Take(aHead, sizeof(aHead)))
             Refuse(oFile, "the file is cut off after " + std::to_string(oFile.GetSize()) + " bytes");
-        const std::uint64_t nLength = ReadNumber(aHead, 4, true);
-        if (nLength + 12 > oFile.GetSize() - nAt)
-            Refuse(oFile, "the file is cut off within the part at byte " + std::to_string(nAt));
+        nType = ReadNumber(aHead + 4, 4, true);
         std::uint32_t nSum = codec::Checksum(0, aHead + 4, 4);
-        for (std::uint64_t nDone = 0; nDone < nLength; nDone += oPiece.size())
+        std::uint64_t nLeft = ReadNumber(aHead, 4, true);
+        while (nLeft > 0)
         {
-            const auto nBytes = static_cast<std::size_t>(std::min<std::uint64_t>(oPiece.size(), nLength - nDone));
-            oFile.Read(nAt + 8 + nDone, oPiece.data(), nBytes);
-            nSum = codec::Checksum(nSum, oPiece.data(), nBytes);
+            const auto oBytes = oSequence.Next(nLeft);
+            if (oBytes.empty())
+                break;
+            nSum = codec::Checksum(nSum, oBytes.data(), oBytes.size());
+            nLeft -= oBytes.size();
         }
         unsigned char aSum[4];
-        oFile.Read(nAt + 8 + nLength, aSum, 4);
+        if (nLeft > 0 || !oSequence.Take(aSum, sizeof(aSum)))
+            Refuse(oFile, "the file is cut off within the part at byte " + std::to_string(nAt));
         // Parts that do not change pixels begin with a small letter, but for that of transparency.
-        const std::uint64_t nType = ReadNumber(aHead + 4, 4, true);
         if (nSum != ReadNumber(aSum, 4, true) && (aHead[4] < 'a' || nType == TRANSPARENCY))
             Refuse(oFile,
                    "the part at byte " + std::to_string(nAt) + " is damaged: its checksum is not that of its bytes");
-        if (nType == END)
-            return;
-        nAt += nLength + 12;
     }
 }
 

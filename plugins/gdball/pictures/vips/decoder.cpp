@@ -3,7 +3,7 @@
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
-#include <cstring>
+#include <new>
 
 namespace krv::plugins::gdball
 {
@@ -16,7 +16,7 @@ constexpr std::uint64_t MOST_WHOLE = std::uint64_t{384} << 20;
 // Rows that libvips keeps of a picture in order.
 constexpr std::uint64_t MOST_ROWS = std::uint64_t{64} << 20;
 constexpr unsigned int KEPT_ROWS = 16;
-constexpr unsigned int PASSED_ROWS = 64; // at once
+constexpr unsigned int PASSED_ROWS = 64; // at once, over those that nobody wants
 
 // The loader of pictures in WebP, which libvips runs over all of a picture in threads of its own unless it says that it
 // goes from row to row, as it does.
@@ -89,6 +89,8 @@ Decoder::Decoder(Picture& oPicture) : moPicture(oPicture)
         throw FileFormatException(oPicture.mpoFile->GetName(),
                                   oPicture.mpoFile->GetName() + ": a " + GetPictureName(oPicture.meKind) +
                                       " file of more than " + std::to_string(MOST_WHOLE >> 20) + " MiB is not read");
+    if (oPicture.mnPage != 1)
+        CheckPage();
     Listener oListener(oPicture.mpoFile->GetName(), oPicture.moSaid);
     const std::string trouble = std::string("the ") + GetPictureName(oPicture.meKind) + " picture cannot be opened";
     mpoOperation.reset(NewLoader(oPicture.meKind));
@@ -106,9 +108,6 @@ Decoder::Decoder(Picture& oPicture) : moPicture(oPicture)
     g_object_set(pOperation, "access", VIPS_ACCESS_SEQUENTIAL, "fail_on", eFail, nullptr);
     if (HasPages(oPicture.meKind))
         g_object_set(pOperation, "page", static_cast<int>(oPicture.mnPage) - 1, nullptr);
-    else if (oPicture.mnPage != 1)
-        throw FileFormatException(oPicture.mpoFile->GetName(), oPicture.mpoFile->GetName() + ": there is no page " +
-                                                                   std::to_string(oPicture.mnPage) + ", only 1");
     g_signal_connect(pOperation, "invalidate", G_CALLBACK(OnTrouble), this);
     // Not by the cache of operations, whoever set that up.
     const bool bBuilt = vips_object_build(VIPS_OBJECT(pOperation)) == 0;
@@ -148,6 +147,18 @@ void Decoder::Fail(Listener& oListener, const std::string& what) const
     oListener.Fail(what);
 }
 
+void Decoder::CheckPage() const
+{
+    Picture oFirst = moPicture;
+    oFirst.mnPage = 1;
+    const std::string& name = moPicture.mpoFile->GetName();
+    const Decoder oDecoder(oFirst);
+    const int nPages = HasPages(moPicture.meKind) ? vips_image_get_n_pages(&oDecoder.GetImage()) : 1;
+    if (static_cast<unsigned int>(nPages) < moPicture.mnPage)
+        throw DataException(name + ": there is no page " + std::to_string(moPicture.mnPage) + "; the last one is " +
+                            std::to_string(nPages));
+}
+
 void Decoder::CheckMemory() const
 {
     const std::string& name = moPicture.mpoFile->GetName();
@@ -165,33 +176,42 @@ void Decoder::CheckMemory() const
 }
 
 // A region belongs to the thread that made it; the decoder may be used by another one next time.
-Owned<VipsRegion> Decoder::Prepare(unsigned int nRows)
+void Decoder::Prepare(unsigned int nRows, VipsRegion* pTarget)
 {
-    const VipsRect oRect = {0, static_cast<int>(mnNext), mpoImage->Xsize,
-                            static_cast<int>(std::min(nRows, PASSED_ROWS))};
+    const VipsRect oRect = {0, static_cast<int>(mnNext), mpoImage->Xsize, static_cast<int>(nRows)};
     Listener oListener(moPicture.mpoFile->GetName(), moPicture.moSaid);
-    Owned<VipsRegion> poRegion(vips_region_new(mpoImage.get()));
-    if (vips_region_prepare(poRegion.get(), &oRect) != 0 || moError || mbTrouble)
+    const Owned<VipsRegion> poRegion(vips_region_new(mpoImage.get()));
+    const int nFailed = pTarget != nullptr ? vips_region_prepare_to(poRegion.get(), pTarget, &oRect, 0, 0)
+                                           : vips_region_prepare(poRegion.get(), &oRect);
+    if (nFailed != 0 || moError || mbTrouble)
         Fail(oListener, "rows from " + std::to_string(mnNext) + " on cannot be decoded");
-    mnNext += static_cast<unsigned int>(oRect.height);
-    return poRegion;
+    mnNext += nRows;
 }
 
 void Decoder::Read(unsigned int nRows, unsigned char* pTarget, std::size_t nPitch)
 {
-    for (const unsigned int nEnd = mnNext + nRows; mnNext < nEnd;)
+    const std::size_t nPixel = VIPS_IMAGE_SIZEOF_PEL(mpoImage.get());
+    // What lies between the rows is pixels of the target to libvips.
+    const bool bPixels = nPitch % nPixel == 0;
+    const int nWidth = bPixels ? static_cast<int>(nPitch / nPixel) : mpoImage->Xsize;
+    const unsigned int nStep = bPixels ? nRows : 1;
+    for (const unsigned int nEnd = mnNext + nRows; mnNext < nEnd; pTarget += nStep * nPitch)
     {
-        const auto nFirst = static_cast<int>(mnNext);
-        const Owned<VipsRegion> poRegion = Prepare(nEnd - mnNext);
-        for (int nRow = nFirst; nRow < static_cast<int>(mnNext); ++nRow, pTarget += nPitch)
-            std::memcpy(pTarget, VIPS_REGION_ADDR(poRegion.get(), 0, nRow), VIPS_IMAGE_SIZEOF_LINE(mpoImage.get()));
+        const Owned<VipsImage> poTarget(
+            vips_image_new_from_memory(pTarget, std::size_t{nStep} * static_cast<std::size_t>(nWidth) * nPixel, nWidth,
+                                       static_cast<int>(nStep), mpoImage->Bands, mpoImage->BandFmt));
+        const Owned<VipsRegion> poRegion(poTarget ? vips_region_new(poTarget.get()) : nullptr);
+        const VipsRect oRect = {0, 0, mpoImage->Xsize, static_cast<int>(nStep)};
+        if (!poRegion || vips_region_image(poRegion.get(), &oRect) != 0)
+            throw std::bad_alloc();
+        Prepare(nStep, poRegion.get());
     }
 }
 
 void Decoder::Skip(unsigned int nRows)
 {
     for (const unsigned int nEnd = mnNext + nRows; mnNext < nEnd;)
-        Prepare(nEnd - mnNext);
+        Prepare(std::min(nEnd - mnNext, PASSED_ROWS), nullptr);
 }
 
 } // namespace krv::plugins::gdball

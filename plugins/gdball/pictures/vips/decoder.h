@@ -31,7 +31,7 @@ class Decoder
 {
 public:
     // Reads the head. Throws FileFormatException for a picture that libvips cannot read, and for one that cannot be
-    // decoded within bounded memory. oPicture outlives the decoder.
+    // decoded within bounded memory, DataException for a page that is not there. oPicture outlives the decoder.
     explicit Decoder(Picture& oPicture);
     ~Decoder();
     Decoder(const Decoder&) = delete;
@@ -48,9 +48,11 @@ public:
     void Skip(unsigned int nRows);
 
 private:
+    // Throws DataException when the picture does not have the page.
+    void CheckPage() const;
     void CheckMemory() const;
-    // As many as are decoded at once.
-    Owned<VipsRegion> Prepare(unsigned int nRows);
+    // Decodes the next rows, into the target when there is one.
+    void Prepare(unsigned int nRows, VipsRegion* pTarget);
     [[noreturn]] void Fail(Listener& oListener, const std::string& what) const;
     static void OnTrouble(VipsOperation*, void* pThis);
 

@@ -26,6 +26,8 @@ void DescribeChannels(VipsInterpretation eMeaning, AuxiliaryData& oTags)
                           eMeaning == VIPS_INTERPRETATION_scRGB;
     const bool bGrey = eMeaning == VIPS_INTERPRETATION_B_W || eMeaning == VIPS_INTERPRETATION_GREY16;
     const unsigned int nColours = bColours ? 3 : bGrey ? 1 : 0;
+    if (eMeaning == VIPS_INTERPRETATION_CMYK)
+        oTags.SetFileMetadataValue("Photometric", "Separated");
     for (unsigned int nAt = 0; nAt < std::min(nColours, oTags.GetChannelCount()); ++nAt)
         oTags.SetChanMetadataValue(INTERPRETATION, bColours ? COLOURS[nAt] : "Gray", nAt + 1);
     if (nColours != 0 && oTags.GetChannelCount() == nColours + 1)
@@ -70,17 +72,28 @@ AuxiliaryData ReadTags(VipsImage& oImage, PictureKind eKind)
     return oTags;
 }
 
+// Levels, masks and tags of a page are its own.
+std::string NamePage(const std::string& fileName, unsigned int nPage)
+{
+    return nPage == 1 ? fileName : fileName + "[page=" + std::to_string(nPage) + "]";
+}
+
 } // namespace
 
 PictureDataset::PictureDataset(const std::string& fileName, Picture oPicture, krv::datasources::IFileFormat* poFormat)
-    : Dataset(fileName, poFormat), FacetsBeside(this)
+    : Dataset(NamePage(fileName, oPicture.mnPage), poFormat), FacetsBeside(this)
 {
     const PictureKind eKind = oPicture.meKind;
+    const unsigned int nPage = oPicture.mnPage;
     auto poSource = std::make_shared<PictureSource>(std::move(oPicture));
     VipsImage& oHead = poSource->GetHead();
     moTags = ReadTags(oHead, eKind);
     if (vips_image_get_typeof(&oHead, VIPS_META_N_PAGES) != 0)
-        mnPages = static_cast<unsigned int>(std::max(1, vips_image_get_n_pages(&oHead)));
+        mnFurther = static_cast<unsigned int>(std::max(0, vips_image_get_n_pages(&oHead) - static_cast<int>(nPage)));
+    if (nPage != 1)
+        mpoOfFile = std::make_unique<support::Sidecars>(fileName, static_cast<unsigned int>(oHead.Xsize),
+                                                        static_cast<unsigned int>(oHead.Ysize),
+                                                        static_cast<unsigned int>(oHead.Bands), false);
     SetImage(std::move(poSource));
 }
 
@@ -146,7 +159,10 @@ void PictureDataset::WriteAuxiliaryData(const AuxiliaryData& oData)
 
 krv::ogc::cs::ICRS* PictureDataset::ReadCRS() const
 {
-    return GetSidecars().ReadCRS().release();
+    std::unique_ptr<krv::ogc::cs::ICRS> poCRS = GetSidecars().ReadCRS();
+    if (!poCRS && mpoOfFile)
+        poCRS = mpoOfFile->ReadCRS();
+    return poCRS.release();
 }
 
 void PictureDataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
@@ -159,7 +175,11 @@ void PictureDataset::UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const
 const krv::ogc::cs::GeocodingInfo& PictureDataset::GetGeocoding() const
 {
     if (!moGeocoding)
-        moGeocoding = GetSidecars().ReadGeocoding().value_or(krv::ogc::cs::GeocodingInfo());
+        moGeocoding = GetSidecars().ReadGeocoding();
+    if (!moGeocoding && mpoOfFile)
+        moGeocoding = mpoOfFile->ReadGeocoding();
+    if (!moGeocoding)
+        moGeocoding.emplace();
     return *moGeocoding;
 }
 

@@ -39,7 +39,7 @@ public:
     const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override;
     void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) override;
 
-    unsigned int CountFurtherImages() const override { return mnPages - 1; }
+    unsigned int CountFurtherImages() const override { return mnFurther; }
 
 private:
     support::Sidecars::Needs GetNeeds() const override { return {true, true, true, true}; }
@@ -48,7 +48,9 @@ private:
 
     std::shared_ptr<PictureWriter> mpoWriter; // null when the file is only read
     krv::datasources::AuxiliaryData moTags;   // of the picture itself
-    unsigned int mnPages = 1;
+    unsigned int mnFurther = 0;               // pages
+    // Of the file of a later page: that lies where the first one does unless what lies beside it says otherwise.
+    std::unique_ptr<support::Sidecars> mpoOfFile;
     bool mbOpacityMeant = false; // by whoever writes a channel of it
     mutable std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding;
 };

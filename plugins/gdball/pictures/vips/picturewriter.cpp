@@ -2,7 +2,6 @@
 
 #include "plugins/gdball/pictures/vips/session.h"
 #include "plugins/gdball/pictures/vips/streams.h"
-#include "plugins/support/writing/newfile.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>
@@ -200,11 +199,7 @@ void PictureWriter::Store()
     if (!mbChanged && IsNamed())
         return;
     CheckThreads(GetFileName());
-    support::NewFile oNew(GetFileName(), TakesPlace());
-    Save(*oNew.GetFile());
-    oNew.GetFile()->Flush();
-    TakeName(oNew);
-    SetNamed();
+    StoreAnew([this](support::File& oFile) { Save(oFile); });
     mbChanged = false;
 }
 

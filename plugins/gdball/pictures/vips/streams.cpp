@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cstdio>
 #include <cstring>
+#include <vector>
 
 namespace krv::plugins::gdball
 {
@@ -16,28 +17,58 @@ struct Reading
     std::string moBefore;
     std::uint64_t mnSkipped;
     std::exception_ptr& moError;
-    std::int64_t mnPlace = 0;
+    std::uint64_t mnPlace = 0;
+    // Decoders ask for a few bytes at a time: these are held.
+    std::vector<unsigned char> moHeld;
+    std::uint64_t mnHeldFrom = 0;
 
     std::int64_t GetSize() const { return static_cast<std::int64_t>(moBefore.size() + mpoFile->GetSize() - mnSkipped); }
-};
 
-gint64 OnRead(VipsSourceCustom*, void* pTarget, gint64 nBytes, void* pReading)
-{
-    auto& oReading = *static_cast<Reading*>(pReading);
-    try
+    std::size_t ReadFile(std::uint64_t nFrom, unsigned char* pTarget, std::size_t nBytes)
     {
-        const auto nPlace = static_cast<std::uint64_t>(oReading.mnPlace);
-        std::size_t nRead = 0;
-        if (nPlace < oReading.moBefore.size())
+        constexpr std::size_t HELD_BYTES = std::size_t{1} << 16;
+        if (nFrom < mnHeldFrom || nFrom >= mnHeldFrom + moHeld.size())
         {
-            nRead = std::min<std::size_t>(static_cast<std::size_t>(nBytes), oReading.moBefore.size() - nPlace);
-            std::memcpy(pTarget, oReading.moBefore.data() + nPlace, nRead);
+            if (nBytes >= HELD_BYTES)
+                return mpoFile->ReadUpTo(nFrom, pTarget, nBytes);
+            moHeld.resize(HELD_BYTES);
+            mnHeldFrom = nFrom;
+            moHeld.resize(mpoFile->ReadUpTo(nFrom, moHeld.data(), moHeld.size()));
+        }
+        const auto nAt = static_cast<std::size_t>(nFrom - mnHeldFrom);
+        const std::size_t nRead = std::min(nBytes, moHeld.size() - nAt);
+        std::copy_n(moHeld.data() + nAt, nRead, pTarget);
+        return nRead;
+    }
+
+    std::size_t Read(unsigned char* pTarget, std::size_t nBytes)
+    {
+        std::size_t nRead = 0;
+        if (mnPlace < moBefore.size())
+        {
+            nRead = std::min<std::size_t>(nBytes, moBefore.size() - mnPlace);
+            std::memcpy(pTarget, moBefore.data() + mnPlace, nRead);
         }
         else
-            nRead = oReading.mpoFile->ReadUpTo(oReading.mnSkipped + nPlace - oReading.moBefore.size(), pTarget,
-                                               static_cast<std::size_t>(nBytes));
-        oReading.mnPlace += static_cast<gint64>(nRead);
-        return static_cast<gint64>(nRead);
+            nRead = ReadFile(mnSkipped + mnPlace - moBefore.size(), pTarget, nBytes);
+        mnPlace += nRead;
+        return nRead;
+    }
+};
+
+// A source of libvips. Its own class for such calls sends them as signals, which cost more than they carry.
+struct FileSource
+{
+    VipsSource moParent;
+    Reading* mpoReading;
+};
+
+gint64 OnRead(VipsSource* pSource, void* pTarget, std::size_t nBytes)
+{
+    Reading& oReading = *reinterpret_cast<FileSource*>(pSource)->mpoReading;
+    try
+    {
+        return static_cast<gint64>(oReading.Read(static_cast<unsigned char*>(pTarget), nBytes));
     }
     catch (...)
     {
@@ -46,20 +77,42 @@ gint64 OnRead(VipsSourceCustom*, void* pTarget, gint64 nBytes, void* pReading)
     }
 }
 
-gint64 OnSeek(VipsSourceCustom*, gint64 nOffset, int nWhence, void* pReading)
+gint64 OnSeek(VipsSource* pSource, gint64 nOffset, int nWhence)
 {
-    auto& oReading = *static_cast<Reading*>(pReading);
-    const std::int64_t nFrom = nWhence == SEEK_SET ? 0 : nWhence == SEEK_CUR ? oReading.mnPlace : oReading.GetSize();
+    Reading& oReading = *reinterpret_cast<FileSource*>(pSource)->mpoReading;
+    const std::int64_t nFrom = nWhence == SEEK_SET   ? 0
+                               : nWhence == SEEK_CUR ? static_cast<std::int64_t>(oReading.mnPlace)
+                                                     : oReading.GetSize();
     std::int64_t nPlace = 0;
     if (__builtin_add_overflow(nFrom, static_cast<std::int64_t>(nOffset), &nPlace) || nPlace < 0)
         return -1;
-    oReading.mnPlace = nPlace;
+    oReading.mnPlace = static_cast<std::uint64_t>(nPlace);
     return nPlace;
 }
 
-void DropReading(gpointer pReading, GClosure*)
+gpointer spFileSourceParent = nullptr;
+
+void OnFinalize(GObject* pObject)
 {
-    delete static_cast<Reading*>(pReading);
+    delete reinterpret_cast<FileSource*>(pObject)->mpoReading;
+    G_OBJECT_CLASS(spFileSourceParent)->finalize(pObject);
+}
+
+void FillClass(gpointer pClass, gpointer)
+{
+    spFileSourceParent = g_type_class_peek_parent(pClass);
+    G_OBJECT_CLASS(pClass)->finalize = &OnFinalize;
+    VIPS_OBJECT_CLASS(pClass)->nickname = "krv_file";
+    VIPS_SOURCE_CLASS(pClass)->read = &OnRead;
+    VIPS_SOURCE_CLASS(pClass)->seek = &OnSeek;
+}
+
+GType GetFileSourceType()
+{
+    static const GType snType =
+        g_type_register_static_simple(VIPS_TYPE_SOURCE, "KrvFileSource", sizeof(VipsSourceClass), &FillClass,
+                                      sizeof(FileSource), nullptr, GTypeFlags{});
+    return snType;
 }
 
 struct Writing
@@ -95,10 +148,10 @@ void DropWriting(gpointer pWriting, GClosure*)
 Owned<VipsSource> MakeSource(std::shared_ptr<const support::File> poFile, const std::string& before,
                              std::uint64_t nSkipped, std::exception_ptr& oError)
 {
-    Owned<VipsSource> poSource(VIPS_SOURCE(vips_source_custom_new()));
-    auto* const poReading = new Reading{std::move(poFile), before, nSkipped, oError};
-    g_signal_connect_data(poSource.get(), "read", G_CALLBACK(OnRead), poReading, &DropReading, GConnectFlags{});
-    g_signal_connect(poSource.get(), "seek", G_CALLBACK(OnSeek), poReading);
+    auto poReading = std::make_unique<Reading>(Reading{std::move(poFile), before, nSkipped, oError, 0, {}, 0});
+    Owned<VipsSource> poSource(VIPS_SOURCE(g_object_new(GetFileSourceType(), nullptr)));
+    reinterpret_cast<FileSource*>(poSource.get())->mpoReading = poReading.release();
+    vips_object_build(VIPS_OBJECT(poSource.get()));
     return poSource;
 }
 
