@@ -171,11 +171,12 @@ bool MultiTypeIO::WriteInPlace(const PixelRect& oPiece, const unsigned char* pSo
     std::vector<std::uint64_t> oChanged(moSplitPositions.size());
     const unsigned int nRuns = bTight ? 1 : oPiece.mnHeight;
     const std::uint64_t nPixels = std::uint64_t{oPiece.mnWidth} * oPiece.mnHeight / nRuns;
+    std::vector<unsigned char*> oRow(oTargets.size());
     for (unsigned int nRun = 0; nRun < nRuns; ++nRun)
     {
-        moSplitter->Run(pSource + nRun * nPitch, oTargets, nPixels, oChanged.data());
         for (std::size_t n = 0; n < oTargets.size(); ++n)
-            oTargets[n] += oPitches[n];
+            oRow[n] = oTargets[n] + nRun * oPitches[n];
+        moSplitter->Run(pSource + nRun * nPitch, oRow, nPixels, oChanged.data());
     }
     TakeChanges(oPiece, oChanged);
     return true;
