@@ -1,7 +1,7 @@
 // Measures reading a stack of images of different types as one type against reading the groups of one type by
 // themselves, tile by tile: through readers of the files, and from a DEMO file that the stack is written to. And
 // writing rasters of one type into channels of three types in memory against memcpy of the rasters.
-//     krv_bench_mixed FOLDER [FILE...]
+//     krv_bench_mixed FOLDER [FILE...] [--only reading|writing]
 // The files are images of one size, made ones by default; FOLDER takes them and the stack.
 
 #include "benchmarks/support/arguments.h"
@@ -209,15 +209,10 @@ void MeasureWriting(const std::string& name, const std::vector<DataType>& oTypes
              Number(static_cast<double>(oCopy.size()) / oTimes[1] / 1e9) + " GB/s of rasters");
 }
 
-} // namespace
-
-int main(int nArguments, char** pArguments)
+void MeasureReading(const std::string& folder, std::vector<std::string> oFiles)
 {
-    const Arguments oArguments(nArguments, pArguments, "FOLDER [FILE...]");
-    const std::string& folder = oArguments.GetWords().front();
     const std::string stack = folder + "/stack.demo";
     std::filesystem::create_directories(folder);
-    std::vector<std::string> oFiles(oArguments.GetWords().begin() + 1, oArguments.GetWords().end());
     if (oFiles.empty())
         for (const SceneKind& oKind : {SceneKind{"3x8U", 3, 8, false}, SceneKind{"1x16U", 1, 16, false}})
             oFiles.push_back(MakeScene(folder, oKind, "deflate", 256, 2048).moPath);
@@ -233,6 +228,18 @@ int main(int nArguments, char** pArguments)
         MeasureStack(stack, oLayers, oType);
         MeasureFiles(*oDataset, oLayers, oType);
     }
+}
+
+} // namespace
+
+int main(int nArguments, char** pArguments)
+{
+    const Arguments oArguments(nArguments, pArguments, "FOLDER [FILE...] [--only reading|writing]");
+    const std::vector<std::string>& oWords = oArguments.GetWords();
+    if (oArguments.Wants("reading"))
+        MeasureReading(oWords.front(), {oWords.begin() + 1, oWords.end()});
+    if (!oArguments.Wants("writing"))
+        return 0;
     PrintHeading("Writing into three types against memcpy of the rasters");
     for (const unsigned int nTile : {256U, 1024U})
     {

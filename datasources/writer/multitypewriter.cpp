@@ -36,6 +36,15 @@ std::vector<krv::gobs::DataType> InFileOrder(const std::vector<krv::gobs::DataTy
     return oByNumber;
 }
 
+class GroupWriter : public BasicWriter
+{
+public:
+    using BasicWriter::BasicWriter;
+
+    // Null before there is an image.
+    IRasterIO* GetIO() const { return mpoChannels->GetOpened().mpoRasterIO.get(); }
+};
+
 } // namespace
 
 MultiTypeWriter::MultiTypeWriter(const MixedTypes& oTypes, std::size_t nChannels, const Place& oPlace)
@@ -90,7 +99,7 @@ MultiTypeWriter::MultiTypeWriter(IRasterDataset* poDataset, const std::vector<Ch
     std::vector<detail::WriterGroup> oGroups;
     oGroups.reserve(oWriters.size());
     for (const ChannelWriter& oWriter : oWriters)
-        oGroups.push_back({std::unique_ptr<IRasterWriter>(oWriter.mpoWriter), {}});
+        oGroups.push_back({std::unique_ptr<IRasterWriter>(oWriter.mpoWriter), {}, nullptr});
 
     moTypes = oTypes;
     mpoChanges->mbStrict = oTypes.mbStrict;
@@ -181,7 +190,11 @@ detail::OpenedChannels MultiTypeWriter::MakeChannels(IRasterDataset& oDataset,
     }
     std::vector<detail::WriterGroup> oGroups;
     for (const auto& [oType, oMembers] : oByType)
-        oGroups.push_back({std::make_unique<BasicWriter>(&oDataset, oMembers.moChannels), oMembers.moPositions});
+    {
+        auto poWriter = std::make_unique<GroupWriter>(&oDataset, oMembers.moChannels);
+        auto* const poMemory = dynamic_cast<detail::MemoryIO<IRasterIO>*>(poWriter->GetIO());
+        oGroups.push_back({std::move(poWriter), oMembers.moPositions, poMemory});
+    }
     detail::OpenedChannels oOpened = Join(std::move(oGroups), oChannels, oPlace);
     oOpened.moInfos = std::move(oInfos);
     return oOpened;

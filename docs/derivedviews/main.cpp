@@ -102,21 +102,80 @@ void ShowPower(IRasterReader& oPan, const std::string& partFile, const std::stri
     Store(oPower, powerFile);
 }
 
-// Turned by some degrees into another grid; the windows that a viewer asks for again come from a cache.
-void ShowTransform(IRasterReader& oScene, const std::string& file)
+// A scene's brightness as amplitude beside a phase that grows to the south-east, as complex pairs: the real part of
+// them, which has a fringe for each turn of the phase.
+void ShowPairs(IRasterReader& oPan, const std::string& file)
+{
+    TransformRasterReader oSmall(&oPan, Reduce(oPan), {SIDE, SIDE, Resampling::eAverage}, false);
+    const RasterPtr oValues(oSmall.ReadRaster(0, 0, SIDE, SIDE));
+    MemoryWriter oParts({SIDE, SIDE, 2, krv::gobs::eDT_32R});
+    Raster oRaster({SIDE, SIDE, 2, krv::gobs::eDT_32R}, {0, 0});
+    const auto* const pValues = reinterpret_cast<const std::uint16_t*>(oValues->GetBuffer());
+    auto* const pParts = reinterpret_cast<float*>(oRaster.GetBuffer());
+    for (unsigned int n = 0; n < SIDE * SIDE; ++n)
+    {
+        const double nX = n % SIDE, nY = n / SIDE;
+        pParts[2 * n] = pValues[n];
+        pParts[2 * n + 1] = static_cast<float>(std::remainder((nX * nX + nY * nY) / 3000, 6.283185307179586));
+    }
+    oParts.WriteRaster(&oRaster);
+    MetaComplexDataset oPairs(oParts.Share().release(), {{1, 2}}, true, eAmplitudePhase);
+    BasicReader oComplex(static_cast<IDataset*>(&oPairs), {}, false);
+    const RasterPtr oScene(oComplex.ReadRaster(0, 0, SIDE, SIDE));
+    Raster oReal({SIDE, SIDE, 1, krv::gobs::eDT_32R}, {0, 0});
+    for (unsigned int n = 0; n < SIDE * SIDE; ++n)
+        reinterpret_cast<float*>(oReal.GetBuffer())[n] = reinterpret_cast<const float*>(oScene->GetBuffer())[2 * n];
+    MemoryWriter oShown({SIDE, SIDE, 1, krv::gobs::eDT_32R});
+    oShown.WriteRaster(&oReal);
+    BasicReader oReader(oShown.Share().release(), {}, true);
+    Store(oReader, file);
+}
+
+// A square of SIDE pixels of a scene, turned by twenty degrees about its centre.
+std::shared_ptr<AffineMap> Turn(const IRasterReader& oScene)
 {
     const double nStep = static_cast<double>(oScene.GetWidth()) / SIDE, nCosine = nStep * std::cos(0.35),
                  nSine = nStep * std::sin(0.35), nHalf = SIDE / 2.0;
-    const GeocodingInfo oTerms(nStep * nHalf - nHalf * (nCosine - nSine), nCosine, -nSine,
-                               nStep * nHalf - nHalf * (nCosine + nSine), nSine, nCosine);
-    TransformRasterReader oTurned(&oScene, std::make_shared<AffineMap>(oTerms), {SIDE, SIDE, Resampling::eCubic},
-                                  false);
-    RasterCache oCache(&oTurned, false, {128, 128});
-    Store(oCache, file);
-    const RasterPtr oAgain(oCache.ReadRaster(100, 100, 300, 200));
+    return std::make_shared<AffineMap>(GeocodingInfo(nStep * nHalf - nHalf * (nCosine - nSine), nCosine, -nSine,
+                                                     nStep * nHalf - nHalf * (nCosine + nSine), nSine, nCosine));
+}
+
+void ShowTransform(IRasterReader& oScene, const std::string& file)
+{
+    TransformRasterReader oTurned(&oScene, Turn(oScene), {SIDE, SIDE, Resampling::eCubic}, false);
+    Store(oTurned, file);
+}
+
+// A viewer asks a cache above a turned scene for three windows that overlap. What the picture has of each tile is its
+// mean with a colour of the window that had it made; what was never made stays black.
+void ShowCache(IRasterReader& oScene, const std::string& file)
+{
+    constexpr unsigned int TILE = 32;
+    constexpr unsigned int WINDOWS[3][4] = {{40, 60, 200, 180}, {150, 130, 220, 200}, {290, 260, 190, 210}};
+    TransformRasterReader oTurned(&oScene, Turn(oScene), {SIDE, SIDE, Resampling::eCubic}, false);
+    RasterCache oCache(&oTurned, false, {TILE, TILE});
+    MemoryWriter oWriter({SIDE, SIDE, 3, krv::gobs::eDT_8U});
+    for (unsigned int nWindow = 0; nWindow < 3; ++nWindow)
+    {
+        const unsigned int* const pWindow = WINDOWS[nWindow];
+        for (unsigned int nY = pWindow[1] / TILE * TILE; nY < pWindow[1] + pWindow[3]; nY += TILE)
+            for (unsigned int nX = pWindow[0] / TILE * TILE; nX < pWindow[0] + pWindow[2]; nX += TILE)
+            {
+                const auto nMade = oCache.GetStatistics().mnMisses;
+                const RasterPtr oTile(oCache.ReadRaster(nX, nY, TILE, TILE));
+                if (oCache.GetStatistics().mnMisses == nMade)
+                    continue; // it was there
+                unsigned char* const p = oTile->GetBuffer();
+                for (unsigned int n = 0; n < TILE * TILE * 3; ++n)
+                    p[n] = static_cast<unsigned char>(n % 3 == nWindow ? (p[n] + 255) / 2 : p[n]);
+                oWriter.WriteRaster(oTile.get());
+            }
+    }
     std::printf("cache: %llu tiles made, %llu found\n",
                 static_cast<unsigned long long>(oCache.GetStatistics().mnMisses),
                 static_cast<unsigned long long>(oCache.GetStatistics().mnHits));
+    BasicReader oReader(oWriter.Share().release(), {}, true);
+    Store(oReader, file);
 }
 
 // Colours of one byte and a brightness of reals, written as one raster and read as one image.
@@ -144,12 +203,21 @@ void ShowMixed(IRasterReader& oScene, const std::string& file)
     Store(oIndex, file);
 }
 
-// A ground of one value, on which only some windows of a scene lie: what nobody wrote takes no memory.
-void ShowMemory(IRasterReader& oScene, const std::string& constFile, const std::string& memoryFile)
+// An image of one value for each channel, in another grid as any other image: a turned square.
+void ShowConstant(const std::string& file)
 {
-    ConstRasterDataset oGround(SIDE, SIDE, {{krv::gobs::eDT_8U, 30}, {krv::gobs::eDT_8U, 60}, {krv::gobs::eDT_8U, 90}});
+    ConstRasterDataset oGround(SIDE, SIDE,
+                               {{krv::gobs::eDT_8U, 30}, {krv::gobs::eDT_8U, 90}, {krv::gobs::eDT_8U, 150}});
     BasicReader oColour(static_cast<IDataset*>(&oGround), {}, false);
-    Store(oColour, constFile);
+    TransformRequest oRequest{SIDE, SIDE, Resampling::eBilinear};
+    oRequest.moBackground = {230};
+    TransformRasterReader oTurned(&oColour, Turn(oColour), oRequest, false);
+    Store(oTurned, file);
+}
+
+// A ground of one value, on which only some windows of a scene lie: what nobody wrote takes no memory.
+void ShowMemory(IRasterReader& oScene, const std::string& file)
+{
     TransformRasterReader oSmall(&oScene, Reduce(oScene), {SIDE, SIDE, Resampling::eAverage}, false);
     MemoryOptions oOptions;
     oOptions.mnFill = 230;
@@ -158,7 +226,7 @@ void ShowMemory(IRasterReader& oScene, const std::string& constFile, const std::
         oWriter.WriteRaster(RasterPtr(oSmall.ReadRaster(nX, nX, 256, 256)).get());
     std::printf("memory: %llu bytes of %u\n", static_cast<unsigned long long>(oWriter.GetBytes()), SIDE * SIDE * 3);
     BasicReader oReader(oWriter.Share().release(), {}, true);
-    Store(oReader, memoryFile);
+    Store(oReader, file);
 }
 
 } // namespace
@@ -176,9 +244,12 @@ int main(int nArguments, char** pArguments)
         const std::string folder = std::string(pArguments[3]) + "/";
         ShowColours(oPan, folder + "colours.tif");
         ShowPower(oPan, folder + "inphase.tif", folder + "power.tif");
+        ShowPairs(oPan, folder + "pairs.tif");
         ShowTransform(oScene, folder + "transform.tif");
+        ShowCache(oScene, folder + "cache.tif");
         ShowMixed(oScene, folder + "mixed.tif");
-        ShowMemory(oScene, folder + "constant.tif", folder + "memory.tif");
+        ShowConstant(folder + "constant.tif");
+        ShowMemory(oScene, folder + "memory.tif");
     }
     catch (const std::exception& oError)
     {

@@ -136,8 +136,11 @@ void CopyData(const void* pSource, BufferType eSource, std::uint64_t nSourceStri
         return CopyData(pSource, eSource, 1, pTarget, eTarget, 1, nPixels * nChannels);
 
     if (nChannels == 1 && nSourceStride == 1 && nTargetStride == 1 && MergerPays(oFrom, oTo, nPixels))
-        return Merger({{eSource, 1}}, eTarget, {{0, 0}})
+    {
+        Merger({{eSource, 1}}, eTarget, {{0, 0}})
             .Run({static_cast<const unsigned char*>(pSource)}, static_cast<unsigned char*>(pTarget), nPixels);
+        return;
+    }
 
     const SourceSide oSource{static_cast<const unsigned char*>(pSource), oFrom.mnPart, nSourceStride * oFrom.mnParts};
     const TargetSide oTarget{static_cast<unsigned char*>(pTarget), oTo.mnPart, nTargetStride * oTo.mnParts};

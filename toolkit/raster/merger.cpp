@@ -22,9 +22,17 @@ constexpr std::uint64_t BLOCK_BYTES = 20 * 1024;
 constexpr std::uint64_t BLOCK_STEP = 64;
 
 // The smallest type that holds the values of all sources; the target's own unless that is larger. Parts are brought
-// together in it, since small ones are moved in fewer steps, and then converted at once.
+// together in it, since small ones are moved in fewer steps, and then converted at once. Sources of one type meet in it
+// where that is converted as it is stored: what is not placed is not converted.
 std::size_t ChooseMeeting(const std::vector<std::size_t>& oParts, std::size_t nTargetPart)
 {
+    const auto bSame = [&](std::size_t nPart)
+    {
+        return nPart == oParts.front();
+    };
+    if (!oParts.empty() && std::all_of(oParts.begin(), oParts.end(), bSame) &&
+        detail::GetKernels().GetMerge(oParts.front(), nTargetPart) != nullptr)
+        return oParts.front();
     std::size_t nBest = nTargetPart;
     for (std::size_t nPart = 0; nPart < detail::PART_COUNT; ++nPart)
     {
@@ -49,7 +57,8 @@ class Merger::Plan
 public:
     Plan(const std::vector<MergeSource>& oSources, BufferType eTarget, const std::vector<MergeChannel>& oChannels);
 
-    void Run(const std::vector<const unsigned char*>& oSources, unsigned char* pTarget, std::uint64_t nPixels);
+    bool CountsChanges() const { return mpCount != nullptr; }
+    std::uint64_t Run(const std::vector<const unsigned char*>& oSources, unsigned char* pTarget, std::uint64_t nPixels);
 
 private:
     struct Stream
@@ -87,9 +96,9 @@ private:
     void MakeScratch();
     void PrepareStreams(const std::vector<const unsigned char*>& oSources, std::uint64_t nFirst, std::uint64_t nPixels,
                         std::size_t nCount);
-    void MergeBlock(unsigned char* pTarget, std::size_t nPixels);
-    std::size_t MergePeriods(detail::MergeLoop pMerge, unsigned char* pTarget, std::size_t nPixelBytes,
-                             std::size_t nPixels);
+    std::uint64_t MergeBlock(unsigned char* pTarget, std::size_t nPixels);
+    std::uint64_t MergePeriods(detail::MergeLoop pMerge, unsigned char* pTarget, std::size_t nPixelBytes,
+                               std::size_t nPixels, std::size_t& nDone);
     void MergeRest(detail::MergeLoop pMerge, std::size_t nFirst, std::size_t nPixels);
     void MergePixels(std::size_t nFirst, std::size_t nPixels);
 
@@ -101,6 +110,7 @@ private:
     std::vector<Stream> moStreams;
     std::vector<Part> moParts; // of a pixel of the result
     bool mbIdentity = false;   // the result is the stream of the only source
+    detail::ChangeCounter mpCount = nullptr;
     std::size_t mnMergedBytes = 0;
     std::size_t mnTargetBytes = 0;
     std::size_t mnPeriodPixels = 0;
@@ -122,6 +132,8 @@ Merger::Plan::Plan(const std::vector<MergeSource>& oSources, BufferType eTarget,
     mnMergedBytes = moParts.size() * detail::PART_BYTES[mnMeeting];
     if (mbIdentity || moParts.empty())
         return;
+    if (moKernels.GetMerge(mnMeeting, moTarget.mnPart) != nullptr && !detail::PartCovers(moTarget.mnPart, mnMeeting))
+        mpCount = moKernels.GetCounter(mnMeeting, moTarget.mnPart);
     MakeVectors();
     MakeScratch();
 }
@@ -277,36 +289,51 @@ void Merger::Plan::MakeScratch()
     }
 }
 
-void Merger::Plan::Run(const std::vector<const unsigned char*>& oSources, unsigned char* pTarget, std::uint64_t nPixels)
+std::uint64_t Merger::Plan::Run(const std::vector<const unsigned char*>& oSources, unsigned char* pTarget,
+                                std::uint64_t nPixels)
 {
+    std::uint64_t nChanged = 0;
     if (nPixels == 0 || moParts.empty())
-        return;
+        return nChanged;
     if (mbIdentity)
-        return moStreams.front().mpConvert(oSources.front(), pTarget, nPixels * moParts.size());
+    {
+        moStreams.front().mpConvert(oSources.front(), pTarget, nPixels * moParts.size());
+        return nChanged;
+    }
     for (std::uint64_t nFirst = 0; nFirst < nPixels; nFirst += mnBlockPixels)
     {
         const auto nCount = static_cast<std::size_t>(std::min(mnBlockPixels, nPixels - nFirst));
         PrepareStreams(oSources, nFirst, nPixels, nCount);
-        MergeBlock(pTarget + nFirst * mnTargetBytes, nCount);
+        nChanged += MergeBlock(pTarget + nFirst * mnTargetBytes, nCount);
     }
+    return nChanged;
 }
 
-void Merger::Plan::MergeBlock(unsigned char* pTarget, std::size_t nPixels)
+std::uint64_t Merger::Plan::MergeBlock(unsigned char* pTarget, std::size_t nPixels)
 {
     const detail::MergeLoop pDirect = moKernels.GetMerge(mnMeeting, moTarget.mnPart);
     const detail::MergeLoop pPlain = moKernels.GetMerge(mnMeeting, mnMeeting);
-    const detail::Converter pFinish = moKernels.GetConverter(mnMeeting, moTarget.mnPart);
     std::size_t nDone = 0;
     std::size_t nMerged = 0;
+    std::uint64_t nChanged = 0;
     if (pDirect != nullptr)
-        nMerged = nDone = MergePeriods(pDirect, pTarget, mnTargetBytes, nPixels);
+    {
+        nChanged = MergePeriods(pDirect, pTarget, mnTargetBytes, nPixels, nDone);
+        nMerged = nDone;
+    }
     else if (pPlain != nullptr)
-        nMerged = MergePeriods(pPlain, mpMerged, mnMergedBytes, nPixels);
+        MergePeriods(pPlain, mpMerged, mnMergedBytes, nPixels, nMerged);
+    if (nDone == nPixels)
+        return nChanged;
     if (pPlain != nullptr && nMerged < nPixels)
         MergeRest(pPlain, nMerged, nPixels);
     else
         MergePixels(nMerged, nPixels);
-    pFinish(mpMerged + nDone * mnMergedBytes, pTarget + nDone * mnTargetBytes, (nPixels - nDone) * moParts.size());
+    const unsigned char* const pRest = mpMerged + nDone * mnMergedBytes;
+    unsigned char* const pTargetRest = pTarget + nDone * mnTargetBytes;
+    const std::size_t nRest = (nPixels - nDone) * moParts.size();
+    moKernels.GetConverter(mnMeeting, moTarget.mnPart)(pRest, pTargetRest, nRest);
+    return nChanged + (mpCount != nullptr ? mpCount(pRest, pTargetRest, nRest, 1) : 0);
 }
 
 void Merger::Plan::PrepareStreams(const std::vector<const unsigned char*>& oSources, std::uint64_t nFirst,
@@ -325,9 +352,9 @@ void Merger::Plan::PrepareStreams(const std::vector<const unsigned char*>& oSour
     }
 }
 
-// The whole periods whose loads stay within the streams; returns the number of pixels done.
-std::size_t Merger::Plan::MergePeriods(detail::MergeLoop pMerge, unsigned char* pTarget, std::size_t nPixelBytes,
-                                       std::size_t nPixels)
+// The whole periods whose loads stay within the streams; nDone: their pixels.
+std::uint64_t Merger::Plan::MergePeriods(detail::MergeLoop pMerge, unsigned char* pTarget, std::size_t nPixelBytes,
+                                         std::size_t nPixels, std::size_t& nDone)
 {
     std::uint64_t nPeriods = nPixels / mnPeriodPixels;
     for (const Stream& oStream : moStreams)
@@ -342,10 +369,13 @@ std::size_t Merger::Plan::MergePeriods(detail::MergeLoop pMerge, unsigned char* 
         moVectorTerms[nTerm].mpSource = moStreams[moTerms[nTerm].mnStream].mpBlock + moTerms[nTerm].mnOffset;
     const std::size_t nVectors = moFirstTerms.size() - 1;
     const std::size_t nPeriodBytes = mnPeriodPixels * nPixelBytes;
+    std::uint64_t nChanged = 0;
     for (std::size_t nVector = 0; nVector < nVectors; ++nVector)
-        pMerge(moVectorTerms.data() + moFirstTerms[nVector], moFirstTerms[nVector + 1] - moFirstTerms[nVector],
-               pTarget + nVector * (nPeriodBytes / nVectors), nPeriodBytes, static_cast<std::size_t>(nPeriods));
-    return static_cast<std::size_t>(nPeriods) * mnPeriodPixels;
+        nChanged +=
+            pMerge(moVectorTerms.data() + moFirstTerms[nVector], moFirstTerms[nVector + 1] - moFirstTerms[nVector],
+                   pTarget + nVector * (nPeriodBytes / nVectors), nPeriodBytes, static_cast<std::size_t>(nPeriods));
+    nDone = static_cast<std::size_t>(nPeriods) * mnPeriodPixels;
+    return nChanged;
 }
 
 // Copies what is left of the streams to where loads may reach beyond it, and merges whole periods of that.
@@ -360,7 +390,8 @@ void Merger::Plan::MergeRest(detail::MergeLoop pMerge, std::size_t nFirst, std::
         oStream.mpBlock = oStream.mpRest;
         oStream.mnAvailable = mnBlockPixels * oStream.mnBytes + mnLoad;
     }
-    MergePeriods(pMerge, mpMerged + nFirst * mnMergedBytes, mnMergedBytes, nPeriods * mnPeriodPixels);
+    std::size_t nDone = 0;
+    MergePeriods(pMerge, mpMerged + nFirst * mnMergedBytes, mnMergedBytes, nPeriods * mnPeriodPixels, nDone);
 }
 
 void Merger::Plan::MergePixels(std::size_t nFirst, std::size_t nPixels)
@@ -387,9 +418,15 @@ Merger::Merger(const std::vector<MergeSource>& oSources, BufferType eTarget, con
 
 Merger::~Merger() = default;
 
-void Merger::Run(const std::vector<const unsigned char*>& oSources, unsigned char* pTarget, std::uint64_t nPixels)
+bool Merger::CountsChanges() const
 {
-    mpoPlan->Run(oSources, pTarget, nPixels);
+    return mpoPlan->CountsChanges();
+}
+
+std::uint64_t Merger::Run(const std::vector<const unsigned char*>& oSources, unsigned char* pTarget,
+                          std::uint64_t nPixels)
+{
+    return mpoPlan->Run(oSources, pTarget, nPixels);
 }
 
 } // namespace krv::raster

@@ -38,9 +38,14 @@ public:
     Merger(const Merger&) = delete;
     Merger& operator=(const Merger&) = delete;
 
+    // Whether Run counts: the sources are of one type, whose values may change on their way to that of the result, and
+    // this processor converts them as it stores them.
+    bool CountsChanges() const;
+
     // pSources: a buffer of nPixels pixels for each source, in their order; pTarget: nPixels pixels of all channels,
-    // every byte of which is written. Nothing need be aligned; buffers do not overlap.
-    void Run(const std::vector<const unsigned char*>& oSources, unsigned char* pTarget, std::uint64_t nPixels);
+    // every byte of which is written. Nothing need be aligned; buffers do not overlap. Returns how many of its values,
+    // of complex ones parts, are not what they were, NaN aside that is still NaN; 0 when it does not count.
+    std::uint64_t Run(const std::vector<const unsigned char*>& oSources, unsigned char* pTarget, std::uint64_t nPixels);
 
 private:
     class Plan;

@@ -19,8 +19,8 @@ constexpr std::uint64_t BLOCK_STEP = 64; // conversions of a block leave no rest
 
 } // namespace
 
-// One target. Its parts are brought together in the source's type first, since only those of its own channels are then
-// converted.
+// One target. Its parts are brought together in the source's type, since only those of its own channels are then
+// converted: at once where the processor can, else in a pass of its own.
 class Splitter::Part
 {
 public:
@@ -34,7 +34,8 @@ public:
 private:
     using Numbers = std::vector<MergeChannel>;
 
-    std::unique_ptr<Merger> MakeMerger(const Numbers& oNumbers) const;
+    std::unique_ptr<Merger> MakeMerger(const Numbers& oNumbers, std::size_t nPart) const;
+    void RunDirect(unsigned char* pTarget, std::size_t nPixels, std::uint64_t* pChanged);
     void Count(const unsigned char* pSource, const unsigned char* pGathered, const unsigned char* pTarget,
                std::size_t nPixels, std::uint64_t* pChanged);
     void CountEach(const unsigned char* pGathered, const unsigned char* pTarget, std::size_t nPixels,
@@ -48,6 +49,7 @@ private:
     detail::Converter mpConvert = nullptr;
     detail::ChangeCounter mpCount = nullptr;     // null when nothing can change
     detail::ChangeCounter mpCountAny = nullptr;  // of what is not 0, for the parts that are dropped
+    std::unique_ptr<Merger> mpDirect;            // to the target; null when that leaves changes uncounted
     std::unique_ptr<Merger> mpGather;            // null when the source lies as the target wants it
     std::unique_ptr<Merger> mpGatherDropped;     // the imaginary parts that a real target has no place for
     std::vector<const unsigned char*> moSources; // for the mergers
@@ -80,19 +82,23 @@ Splitter::Part::Part(BufferType eSource, unsigned int nSourceChannels, const Spl
     for (unsigned int n = 0; n < oTaken.size(); ++n)
         bStraight = bStraight && oTaken[n].mnSource == 0 && oTaken[n].mnChannel == n;
     if (!bStraight)
-        mpGather = MakeMerger(oTaken);
+        mpGather = MakeMerger(oTaken, moSource.mnPart);
+    if (!bStraight && moSource.mnParts <= moTarget.mnParts)
+        mpDirect = MakeMerger(oTaken, moTarget.mnPart);
+    if (mpDirect != nullptr && mpCount != nullptr && !mpDirect->CountsChanges())
+        mpDirect = nullptr;
     if (moSource.mnParts > moTarget.mnParts)
     {
-        mpGatherDropped = MakeMerger(oDropped);
+        mpGatherDropped = MakeMerger(oDropped, moSource.mnPart);
         mpCountAny = oKernels.GetCounter(moSource.mnPart, 0);
     }
 }
 
-std::unique_ptr<Merger> Splitter::Part::MakeMerger(const Numbers& oNumbers) const
+std::unique_ptr<Merger> Splitter::Part::MakeMerger(const Numbers& oNumbers, std::size_t nPart) const
 {
     const auto ePart = static_cast<BufferType>(moSource.mnPart); // buffer types begin with the types of parts
-    return std::make_unique<Merger>(std::vector<MergeSource>{{ePart, static_cast<unsigned int>(mnSourceParts)}}, ePart,
-                                    oNumbers);
+    return std::make_unique<Merger>(std::vector<MergeSource>{{ePart, static_cast<unsigned int>(mnSourceParts)}},
+                                    static_cast<BufferType>(nPart), oNumbers);
 }
 
 void Splitter::Part::Prepare(std::uint64_t nBlockPixels)
@@ -111,6 +117,8 @@ void Splitter::Part::Run(const unsigned char* pSource, unsigned char* pTarget, s
 {
     const unsigned char* pGathered = pSource;
     moSources.front() = pSource;
+    if (mpDirect != nullptr)
+        return RunDirect(pTarget, nPixels, pChanged);
     if (mpGather != nullptr && moSource.mnPart == moTarget.mnPart)
     {
         mpGather->Run(moSources, pTarget, nPixels);
@@ -127,6 +135,20 @@ void Splitter::Part::Run(const unsigned char* pSource, unsigned char* pTarget, s
     }
     if (pChanged != nullptr)
         Count(pSource, pGathered, pTarget, nPixels, pChanged);
+}
+
+void Splitter::Part::RunDirect(unsigned char* pTarget, std::size_t nPixels, std::uint64_t* pChanged)
+{
+    const std::uint64_t nChanged = mpDirect->Run(moSources, pTarget, nPixels);
+    if (pChanged == nullptr || nChanged == 0)
+        return;
+    if (mnParts == 1)
+    {
+        *pChanged += nChanged;
+        return;
+    }
+    mpGather->Run(moSources, moGathered.data(), nPixels);
+    CountEach(moGathered.data(), pTarget, nPixels, pChanged);
 }
 
 // As a rule nothing changed, which one look at all channels tells.

@@ -27,19 +27,6 @@ std::vector<unsigned char> Repeat(const std::vector<unsigned char>& oValue, std:
     return oAll;
 }
 
-// Cuts a rectangle along the tiles; oWork(piece).
-template <typename Work>
-void ForEachPiece(const PixelRect& oRect, const Work& oWork)
-{
-    constexpr unsigned int SIZE = MemoryTiles::TILE_SIZE;
-    const unsigned int nRight = oRect.mnX + oRect.mnWidth;
-    const unsigned int nBottom = oRect.mnY + oRect.mnHeight;
-    for (unsigned int nY = oRect.mnY; nY < nBottom; nY = std::min((nY / SIZE + 1) * SIZE, nBottom))
-        for (unsigned int nX = oRect.mnX; nX < nRight; nX = std::min((nX / SIZE + 1) * SIZE, nRight))
-            oWork(PixelRect{nX, nY, std::min((nX / SIZE + 1) * SIZE, nRight) - nX,
-                            std::min((nY / SIZE + 1) * SIZE, nBottom) - nY});
-}
-
 } // namespace
 
 MemoryTiles::MemoryTiles(unsigned int nWidth, unsigned int nHeight, const krv::gobs::DataType& oType,
@@ -206,9 +193,23 @@ void MemoryIO<Base>::ReadPiece(const PixelRect& oPiece, unsigned char* pTarget, 
     }
 }
 
-// The tiles that a rectangle needs, all of them or none.
 template <typename Base>
-void MemoryIO<Base>::MakeTiles(const PixelRect& oRect)
+unsigned char* MemoryIO<Base>::BeginWriting(const PixelRect& oPiece, std::size_t& nPitch)
+{
+    if (!mbStraight || mbBits)
+        return nullptr;
+    MakeTiles(oPiece, true);
+    if (moBeforeWrite)
+        moBeforeWrite();
+    const PixelRect oTile = First().GetTileRect(oPiece.mnX, oPiece.mnY);
+    nPitch = oTile.mnWidth * GetPixelBytes();
+    return First().Find(First().GetTileNumber(oPiece.mnX, oPiece.mnY)) + (oPiece.mnY - oTile.mnY) * nPitch +
+           (oPiece.mnX - oTile.mnX) * GetPixelBytes();
+}
+
+// The tiles that a rectangle needs, all of them or none. bFill: also those that are about to be written whole.
+template <typename Base>
+void MemoryIO<Base>::MakeTiles(const PixelRect& oRect, bool bFill)
 {
     std::uint64_t nBytes = 0;
     ForEachPiece(oRect,
@@ -231,7 +232,7 @@ void MemoryIO<Base>::MakeTiles(const PixelRect& oRect)
                          if (oTiles->Find(oTiles->GetTileNumber(oPiece.mnX, oPiece.mnY)) != nullptr)
                              continue;
                          const bool bWhole = mbStraight && oPiece == oTiles->GetTileRect(oPiece.mnX, oPiece.mnY);
-                         oTiles->Make(oPiece.mnX, oPiece.mnY, !bWhole);
+                         oTiles->Make(oPiece.mnX, oPiece.mnY, bFill || !bWhole);
                      }
                  });
 }
@@ -239,7 +240,7 @@ void MemoryIO<Base>::MakeTiles(const PixelRect& oRect)
 template <typename Base>
 void MemoryIO<Base>::WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch)
 {
-    MakeTiles(oRect);
+    MakeTiles(oRect, false);
     if (moBeforeWrite)
         moBeforeWrite();
     ForEachPiece(

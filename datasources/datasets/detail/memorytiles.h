@@ -5,6 +5,7 @@
 #include "toolkit/core/hblock.h"
 #include "toolkit/exceptions/place.h"
 
+#include <algorithm>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -69,6 +70,19 @@ private:
     std::uint64_t mnBytes = 0;
 };
 
+// Cuts a rectangle along the tiles; oWork(piece).
+template <typename Work>
+void ForEachPiece(const PixelRect& oRect, const Work& oWork)
+{
+    constexpr unsigned int SIZE = MemoryTiles::TILE_SIZE;
+    const unsigned int nRight = oRect.mnX + oRect.mnWidth;
+    const unsigned int nBottom = oRect.mnY + oRect.mnHeight;
+    for (unsigned int nY = oRect.mnY; nY < nBottom; nY = std::min((nY / SIZE + 1) * SIZE, nBottom))
+        for (unsigned int nX = oRect.mnX; nX < nRight; nX = std::min((nX / SIZE + 1) * SIZE, nRight))
+            oWork(PixelRect{nX, nY, std::min((nX / SIZE + 1) * SIZE, nRight) - nX,
+                            std::min((nY / SIZE + 1) * SIZE, nBottom) - nY});
+}
+
 // A channel of an image in memory.
 struct MemoryChannel
 {
@@ -90,6 +104,11 @@ public:
     unsigned int GetTileWidth() const override;
     unsigned int GetTileHeight() const override;
 
+    // Where the pixels of a piece of one tile lie, for who writes them there at once: all of them, before anything else
+    // is asked of this object. nPitch: bytes from row to row. Null where they are not laid out as those of a window.
+    // Throws what writing throws; nothing has changed then.
+    unsigned char* BeginWriting(const PixelRect& oPiece, std::size_t& nPitch);
+
 private:
     const MemoryTiles& First() const { return *moChannels.front().mpoTiles; }
     std::size_t GetPixelBytes() const override { return First().GetValueBytes() * moChannels.size(); }
@@ -97,7 +116,7 @@ private:
     void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) override;
     void ReadPiece(const PixelRect& oPiece, unsigned char* pTarget, std::size_t nPitch);
     void WritePiece(const PixelRect& oPiece, const unsigned char* pSource, std::size_t nPitch);
-    void MakeTiles(const PixelRect& oRect);
+    void MakeTiles(const PixelRect& oRect, bool bFill);
     unsigned char* GetScratch(const PixelRect& oPiece);
 
     std::vector<MemoryChannel> moChannels;

@@ -95,6 +95,7 @@ MultiTypeIO::MultiTypeIO(std::vector<WriterGroup> oGroups, const krv::gobs::Data
         oTargets.push_back(
             {krv::gobs::QRFDataType2RasterBufferType(oGroup.mpoWriter->GetDataType()), oGroup.moPositions});
         mnBlockHeight = std::max(mnBlockHeight, oGroup.mpoWriter->GetTileHeight());
+        mbMemory = mbMemory && oGroup.mpoMemory != nullptr;
         moSplitPositions.insert(moSplitPositions.end(), oGroup.moPositions.begin(), oGroup.moPositions.end());
     }
     mnPixelBytes = moSplitPositions.size() * (oType.GetValueBits() / 8);
@@ -139,8 +140,46 @@ void MultiTypeIO::WritePixels(const PixelRect& oRect, const unsigned char* pSour
 {
     if (mpoChanges->mbStrict)
         return WriteBand(oRect, pSource, nPitch);
-    ForEachBand(oRect, mnBlockHeight,
-                [&](const PixelRect& oBand) { WriteBand(oBand, pSource + (oBand.mnY - oRect.mnY) * nPitch, nPitch); });
+    const auto oWrite = [&](const PixelRect& oPart)
+    {
+        const unsigned char* const pPart =
+            pSource + (oPart.mnY - oRect.mnY) * nPitch + (oPart.mnX - oRect.mnX) * mnPixelBytes;
+        if (!mbMemory || !WriteInPlace(oPart, pPart, nPitch))
+            WriteBand(oPart, pPart, nPitch);
+    };
+    if (mbMemory)
+        ForEachPiece(oRect, oWrite);
+    else
+        ForEachBand(oRect, mnBlockHeight, oWrite);
+}
+
+// Straight to where the pixels stay. False, and nothing is done, where a group has them otherwise.
+bool MultiTypeIO::WriteInPlace(const PixelRect& oPiece, const unsigned char* pSource, std::size_t nPitch)
+{
+    std::vector<unsigned char*> oTargets;
+    std::vector<std::size_t> oPitches(moGroups.size());
+    bool bTight = nPitch == oPiece.mnWidth * mnPixelBytes;
+    for (const WriterGroup& oGroup : moGroups)
+    {
+        std::size_t& nOwn = oPitches[oTargets.size()];
+        oTargets.push_back(oGroup.mpoMemory->BeginWriting(oPiece, nOwn));
+        if (oTargets.back() == nullptr)
+            return false;
+        bTight = bTight && nOwn == oPiece.mnWidth * oGroup.moPositions.size() *
+                                       (oGroup.mpoWriter->GetDataType().GetValueBits() / 8);
+    }
+    std::vector<std::uint64_t> oChanged(moSplitPositions.size());
+    const unsigned int nRuns = bTight ? 1 : oPiece.mnHeight;
+    const std::uint64_t nPixels = std::uint64_t{oPiece.mnWidth} * oPiece.mnHeight / nRuns;
+    std::vector<unsigned char*> oRow(oTargets.size());
+    for (unsigned int nRun = 0; nRun < nRuns; ++nRun)
+    {
+        for (std::size_t n = 0; n < oTargets.size(); ++n)
+            oRow[n] = oTargets[n] + nRun * oPitches[n];
+        moSplitter->Run(pSource + nRun * nPitch, oRow, nPixels, oChanged.data());
+    }
+    TakeChanges(oPiece, oChanged);
+    return true;
 }
 
 void MultiTypeIO::WriteBand(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch)

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "datasources/datasets/detail/memorytiles.h"
 #include "datasources/interfaces/windowedio.h"
 #include "datasources/writer/irasterwriter.h"
 #include "gobs/raster/datatype.h"
@@ -18,7 +19,8 @@ namespace krv::datasources::detail
 struct WriterGroup
 {
     std::unique_ptr<IRasterWriter> mpoWriter;
-    std::vector<unsigned int> moPositions; // of its channels in the raster, from 0
+    std::vector<unsigned int> moPositions;    // of its channels in the raster, from 0
+    MemoryIO<IRasterIO>* mpoMemory = nullptr; // the writer's, when its pixels are in memory
 };
 
 // How conversion changed samples; the writer's, which outlives its I/O.
@@ -50,6 +52,7 @@ private:
     std::size_t GetPixelBytes() const override { return mnPixelBytes; }
     void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) override;
     void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) override;
+    bool WriteInPlace(const PixelRect& oPiece, const unsigned char* pSource, std::size_t nPitch);
     void WriteBand(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch);
     void TakeChanges(const PixelRect& oRect, const std::vector<std::uint64_t>& oChanged);
 
@@ -57,6 +60,7 @@ private:
     krv::gobs::DataType moType;
     std::size_t mnPixelBytes = 0;
     unsigned int mnBlockHeight = 1; // of the highest blocks
+    bool mbMemory = true;           // all groups lie in memory
     std::shared_ptr<SampleChanges> mpoChanges;
     std::vector<unsigned int> moSplitPositions; // of the splitter's channels, in its order
     std::optional<krv::raster::Splitter> moSplitter;

@@ -2,12 +2,16 @@
 
 // The inner loops of power. One source file for each instruction set includes this and is compiled with options of its
 // own, so everything here is local to the file and calls nothing that is not. Plain loops, which the compiler turns
-// into vectors.
+// into vectors; where pixels are complex and it takes pairs apart, they are vectors from the beginning.
 
 #include "gobs/power/detail/powerkernels.h"
 
 #include <cstdint>
 #include <type_traits>
+
+#if defined(__AVX512DQ__)
+#include <immintrin.h>
+#endif
 
 namespace krv::gobs::detail
 {
@@ -19,6 +23,77 @@ namespace
 template <typename T>
 using PowerOf = std::conditional_t<std::is_same_v<T, float> || sizeof(T) <= 2, float, double>;
 
+// The first pixels by whole vectors, of N samples each; returns how many. None where the plain loop is as good.
+template <std::size_t N, typename T>
+inline std::size_t SquareVectors(const T*, std::size_t, PowerOf<T>*)
+{
+    return 0;
+}
+
+#if defined(__AVX512DQ__)
+
+// Sums of eight pixels of which two vectors hold two terms each:
+//     first, second    a0 A0 a1 A1 ..   b0 B0 b1 B1 ..      a0+A0 b0+B0 a1+A1 b1+B1 ..
+constexpr long long IN_ORDER[8] = {0, 2, 4, 6, 1, 3, 5, 7};
+
+inline __m512i AddNeighbours(__m512i oFirst, __m512i oSecond)
+{
+    const __m512i oSums =
+        _mm512_add_epi64(_mm512_unpacklo_epi64(oFirst, oSecond), _mm512_unpackhi_epi64(oFirst, oSecond));
+    return _mm512_permutexvar_epi64(_mm512_loadu_si512(IN_ORDER), oSums);
+}
+
+// re * re + im * im of 16 values, at most 2^31.
+inline __m512i SquarePairs(const std::int16_t* p)
+{
+    const __m512i oPairs = _mm512_loadu_si512(p);
+    return _mm512_madd_epi16(oPairs, oPairs);
+}
+
+template <>
+inline std::size_t SquareVectors<2, std::int16_t>(const std::int16_t* p, std::size_t nPixels, float* pPower)
+{
+    std::size_t n = 0;
+    for (; n + 16 <= nPixels; n += 16)
+        _mm512_storeu_ps(pPower + n, _mm512_cvtepu32_ps(SquarePairs(p + 2 * n)));
+    return n;
+}
+
+// Two neighbours as one of 64 bits.
+inline __m512i AddHalves(__m512i o)
+{
+    return _mm512_add_epi64(_mm512_and_si512(o, _mm512_set1_epi64(0xFFFFFFFF)), _mm512_srli_epi64(o, 32));
+}
+
+template <>
+inline std::size_t SquareVectors<8, std::int16_t>(const std::int16_t* p, std::size_t nPixels, float* pPower)
+{
+    std::size_t n = 0;
+    for (; n + 8 <= nPixels; n += 8)
+        _mm256_storeu_ps(pPower + n, _mm512_cvtepi64_ps(AddNeighbours(AddHalves(SquarePairs(p + 8 * n)),
+                                                                      AddHalves(SquarePairs(p + 8 * n + 32)))));
+    return n;
+}
+
+// Squares of 32R are exact as doubles, so that one more multiplication may go with the addition.
+template <>
+inline std::size_t SquareVectors<2, float>(const float* p, std::size_t nPixels, float* pPower)
+{
+    const __m256i oInOrder = _mm512_cvtepi64_epi32(_mm512_loadu_si512(IN_ORDER));
+    std::size_t n = 0;
+    for (; n + 8 <= nPixels; n += 8)
+    {
+        const __m512d oFirst = _mm512_cvtps_pd(_mm256_loadu_ps(p + 2 * n));
+        const __m512d oSecond = _mm512_cvtps_pd(_mm256_loadu_ps(p + 2 * n + 8));
+        const __m512d oReal = _mm512_unpacklo_pd(oFirst, oSecond), oImaginary = _mm512_unpackhi_pd(oFirst, oSecond);
+        const __m512d oPower = _mm512_fmadd_pd(oReal, oReal, _mm512_mul_pd(oImaginary, oImaginary));
+        _mm256_storeu_ps(pPower + n, _mm256_permutevar8x32_ps(_mm512_cvtpd_ps(oPower), oInOrder));
+    }
+    return n;
+}
+
+#endif
+
 // One complex value a pixel: the bulk of what there is.
 //     samples   re0 im0 re1 im1 re2 im2 ..
 //     squares   re0*re0 im0*im0 re1*re1 im1*im1 ..   in lanes twice as wide (of 16 bits)
@@ -26,19 +101,20 @@ using PowerOf = std::conditional_t<std::is_same_v<T, float> || sizeof(T) <= 2, f
 template <typename T>
 inline void SquarePairs(const T* p, std::size_t nPixels, PowerOf<T>* pPower)
 {
+    const std::size_t nFirst = SquareVectors<2>(p, nPixels, pPower);
     if constexpr (std::is_same_v<T, std::int16_t> || std::is_same_v<T, std::uint16_t>)
     {
         // Squares of 16 bits add up exactly in 32 or 64 and are rounded once, as doubles would be.
         using Wide = std::conditional_t<std::is_signed_v<T>, std::int32_t, std::uint32_t>;
         using Sum = std::conditional_t<std::is_signed_v<T>, std::uint32_t, std::uint64_t>;
-        for (std::size_t n = 0; n < nPixels; ++n)
+        for (std::size_t n = nFirst; n < nPixels; ++n)
         {
             const Wide nReal = p[2 * n], nImaginary = p[2 * n + 1];
             pPower[n] = static_cast<float>(static_cast<Sum>(nReal * nReal) + static_cast<Sum>(nImaginary * nImaginary));
         }
     }
     else
-        for (std::size_t n = 0; n < nPixels; ++n)
+        for (std::size_t n = nFirst; n < nPixels; ++n)
         {
             const double nReal = static_cast<double>(p[2 * n]), nImaginary = static_cast<double>(p[2 * n + 1]);
             pPower[n] = static_cast<PowerOf<T>>(nReal * nReal + nImaginary * nImaginary);
@@ -52,7 +128,8 @@ inline void AddAll(const PowerJob& oJob)
     const std::size_t nSamples = SAMPLES != 0 ? SAMPLES : oJob.mnSamples;
     const T* const p = reinterpret_cast<const T*>(oJob.mpPixels);
     auto* const pPower = reinterpret_cast<PowerOf<T>*>(oJob.mpPower);
-    for (std::size_t n = 0; n < oJob.mnPixels; ++n)
+    const std::size_t nFirst = SQUARE ? SquareVectors<SAMPLES>(p, oJob.mnPixels, pPower) : 0;
+    for (std::size_t n = nFirst; n < oJob.mnPixels; ++n)
     {
         double nSum = 0;
         for (std::size_t i = 0; i < nSamples; ++i)

@@ -78,41 +78,47 @@ protected:
 
 } // namespace
 
-// Tile by tile with margins, which stay behind, in an order of channels of its own.
+// Tile by tile with margins, which stay behind: in an order of channels of its own, and all channels of a type in the
+// order in which they lie in memory, where they are written in place.
 TEST_F(MultiTypeWriterTest, EveryChannelGoesToItsOwnPlaceInItsOwnType)
 {
-    const Channels oList = {4, 5, 2, 1};
-    MultiTypeWriter oWriter(Rasters(), oList);
-    EXPECT_EQ(oWriter.GetDataType(), DataType(gobs::eDT_32R));
-    EXPECT_EQ(oWriter.GetChannelsInfo()[2]->GetDataType(), DataType(gobs::eDT_16S));
-    const std::string pixels = MakePixels(4, gobs::eDT_32R);
-    const ReferenceImage oImage{WIDTH, HEIGHT, 16, pixels};
-    oWriter.SetTileSize(70, 33);
-    oWriter.SetMargins(3, 5, eMirror);
-    for (unsigned int nTile = 0; nTile < oWriter.GetTileCount(); ++nTile)
+    for (const Channels& oList : {Channels{4, 5, 2, 1}, Channels{4, 1, 2, 3, 5}})
     {
-        const RasterPtr oTile(oWriter.GetRaster(nTile));
-        const std::string bytes =
-            oImage.WithMargins(oTile->GetX(), oTile->GetY(), oTile->GetWidth(), oTile->GetHeight(), 3, 5, eConstant);
-        std::copy(bytes.begin(), bytes.end(), oTile->GetBuffer());
-        oWriter.WriteRaster(oTile.get());
-        const RasterPtr oBack(oWriter.GetRaster(nTile));
-        EXPECT_EQ(oBack->GetXMargin(), 3U);
+        const auto nCount = static_cast<unsigned int>(oList.size());
+        MultiTypeWriter oWriter(Rasters(), oList);
+        EXPECT_EQ(oWriter.GetDataType(), DataType(gobs::eDT_32R));
+        EXPECT_EQ(oWriter.GetChannelsInfo()[2]->GetDataType(), DataType(gobs::eDT_16S));
+        const std::string pixels = MakePixels(nCount, gobs::eDT_32R, nCount);
+        const ReferenceImage oImage{WIDTH, HEIGHT, 4 * nCount, pixels};
+        oWriter.SetTileSize(70, 33);
+        oWriter.SetMargins(3, 5, eMirror);
+        for (unsigned int nTile = 0; nTile < oWriter.GetTileCount(); ++nTile)
+        {
+            const RasterPtr oTile(oWriter.GetRaster(nTile));
+            const std::string bytes = oImage.WithMargins(oTile->GetX(), oTile->GetY(), oTile->GetWidth(),
+                                                         oTile->GetHeight(), 3, 5, eConstant);
+            std::copy(bytes.begin(), bytes.end(), oTile->GetBuffer());
+            oWriter.WriteRaster(oTile.get());
+            const RasterPtr oBack(oWriter.GetRaster(nTile));
+            EXPECT_EQ(oBack->GetXMargin(), 3U);
+        }
+        EXPECT_EQ(oWriter.GetChangedSamples(), std::vector<std::uint64_t>(nCount));
+        oWriter.SetMargins(0, 0, eMirror);
+        EXPECT_EQ(ReadPixels(oWriter), pixels);
+        oWriter.SetMargins(4, 4, eMirror);
+        const RasterPtr oCorner(oWriter.ReadRaster(0, 0, 20, 20));
+        EXPECT_EQ(PixelsOf(*oCorner), oImage.WithMargins(0, 0, 20, 20, 4, 4, eMirror));
+        IDataset& oDataset = moMemory;
+        for (std::size_t n = 0; n < oList.size(); ++n)
+            EXPECT_EQ(ReadPixels(BasicReader(&oDataset, {oList[n]}, false)),
+                      Channel(pixels, gobs::eDT_32R, n, nCount, TYPES[oList[n] - 1]))
+                << "channel " << oList[n];
+        if (nCount == 4)
+            EXPECT_EQ(ReadPixels(BasicReader(&oDataset, {3}, false)), std::string(WIDTH * HEIGHT, '\0'))
+                << "not listed";
+        MultiTypeReader oReader(&oDataset, oList, gobs::eDT_32R, eOwnPlace);
+        EXPECT_EQ(ReadPixels(oReader), pixels);
     }
-    EXPECT_EQ(oWriter.GetChangedSamples(), std::vector<std::uint64_t>(4));
-    oWriter.SetMargins(0, 0, eMirror);
-    EXPECT_EQ(ReadPixels(oWriter), pixels);
-    oWriter.SetMargins(4, 4, eMirror);
-    const RasterPtr oCorner(oWriter.ReadRaster(0, 0, 20, 20));
-    EXPECT_EQ(PixelsOf(*oCorner), oImage.WithMargins(0, 0, 20, 20, 4, 4, eMirror));
-    IDataset& oDataset = moMemory;
-    for (std::size_t n = 0; n < oList.size(); ++n)
-        EXPECT_EQ(ReadPixels(BasicReader(&oDataset, {oList[n]}, false)),
-                  Channel(pixels, gobs::eDT_32R, n, 4, TYPES[oList[n] - 1]))
-            << "channel " << oList[n];
-    EXPECT_EQ(ReadPixels(BasicReader(&oDataset, {3}, false)), std::string(WIDTH * HEIGHT, '\0')) << "not listed";
-    MultiTypeReader oReader(&oDataset, oList, gobs::eDT_32R, eOwnPlace);
-    EXPECT_EQ(ReadPixels(oReader), pixels);
 }
 
 TEST_F(MultiTypeWriterTest, ChangedSamplesAreCountedOrRefusedBeforeAnythingIsWritten)

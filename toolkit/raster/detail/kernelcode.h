@@ -145,6 +145,11 @@ template <>
 inline constexpr bool CAN_STORE<float, double> = true;
 
 #if defined(__AVX512VBMI__)
+// And the pairs of mixed files that are written, whose values may change: from longer types to shorter ones.
+template <typename TSource, typename TTarget>
+inline constexpr bool CAN_NARROW = !std::is_same_v<TSource, TTarget> && sizeof(TSource) > 1 &&
+                                   sizeof(TTarget) <= sizeof(TSource) &&
+                                   (std::is_integral_v<TSource> ? std::is_integral_v<TTarget> : sizeof(TTarget) <= 4);
 using MergeVector = __m512i;
 constexpr std::size_t LOAD_BYTES = 64;
 
@@ -206,6 +211,72 @@ inline void StorePart(double* p, __m512i o)
         _mm512_storeu_pd(p, _mm512_cvtps_pd(_mm256_castsi256_ps(_mm512_castsi512_si256(o))));
     else
         _mm512_storeu_pd(p, _mm512_cvtepi32_pd(WideInts(o, TSource(), double())));
+}
+
+template <typename T, std::size_t N>
+struct Lanes
+{
+    typedef T Type __attribute__((vector_size(N * sizeof(T))));
+};
+
+// Stores values as those of a type that is no longer. Returns -1 in the lane of each that changed, 0 in the others.
+template <typename TSource, typename TTarget>
+inline auto StoreNarrow(unsigned char* pTarget, MergeVector o)
+{
+    using Limits = std::numeric_limits<TTarget>;
+    constexpr std::size_t N = sizeof(MergeVector) / sizeof(TSource);
+    using Source = typename Lanes<TSource, N>::Type;
+    using Target = typename Lanes<TTarget, N>::Type;
+    const Source oFrom = __builtin_bit_cast(Source, o);
+    Target oTo;
+    decltype(oFrom != oFrom) oChanged;
+    if constexpr (std::is_integral_v<TSource>)
+    {
+        Source oKept = oFrom;
+        if constexpr (std::is_signed_v<TSource>)
+        {
+            const auto nLowest = ConvertValue<TSource>(Limits::min());
+            oKept = oKept < nLowest ? Source{} + nLowest : oKept;
+        }
+        const auto nMost = ConvertValue<TSource>(Limits::max());
+        oKept = oKept > nMost ? Source{} + nMost : oKept;
+        oChanged = oKept != oFrom;
+        oTo = __builtin_convertvector(oKept, Target);
+    }
+    else if constexpr (std::is_integral_v<TTarget>)
+    {
+        using Whole = std::conditional_t<std::is_signed_v<TTarget>, std::int32_t, std::uint32_t>;
+        using Wholes = typename Lanes<Whole, N>::Type;
+        Wholes oKept;
+        if constexpr (sizeof(TSource) == 4)
+            oKept = __builtin_bit_cast(Wholes, IntsOf<TTarget>(_mm512_castsi512_ps(o)));
+        else
+            oKept = __builtin_bit_cast(Wholes, IntsOf<TTarget>(_mm512_castsi512_pd(o)));
+        constexpr Whole LOWEST = Limits::min(), MOST = Limits::max();
+        if constexpr (sizeof(TTarget) < 4 && LOWEST != 0)
+            oKept = oKept < LOWEST ? Wholes{} + LOWEST : oKept;
+        if constexpr (sizeof(TTarget) < 4)
+            oKept = oKept > MOST ? Wholes{} + MOST : oKept;
+        Source oBack;
+        if constexpr (sizeof(TSource) == 4)
+            oBack = __builtin_convertvector(oKept, Source);
+        else if constexpr (LOWEST != 0) // GCC takes these apart
+            oBack = __builtin_bit_cast(Source, _mm512_cvtepi32_pd(__builtin_bit_cast(__m256i, oKept)));
+        else
+            oBack = __builtin_bit_cast(Source, _mm512_cvtepu32_pd(__builtin_bit_cast(__m256i, oKept)));
+        oChanged = oBack != oFrom;
+        if constexpr (sizeof(TTarget) == sizeof(TSource)) // the last whole number is no real, see IsChanged
+            oChanged |= oFrom >= static_cast<TSource>(Limits::max() / 2 + 1) * 2;
+        oTo = __builtin_convertvector(oKept, Target);
+    }
+    else
+    {
+        oTo = __builtin_convertvector(oFrom, Target);
+        const auto oBack = __builtin_bit_cast(Source, _mm512_cvtps_pd(__builtin_bit_cast(__m256, oTo)));
+        oChanged = (oBack < oFrom) | (oBack > oFrom);
+    }
+    std::memcpy(pTarget, &oTo, sizeof oTo);
+    return oChanged;
 }
 
 template <typename TSource, typename TTarget>
@@ -352,10 +423,40 @@ inline void StoreVector(unsigned char* pBytes, MergeVector o)
 }
 #endif
 
+// Stores vectors one after the other and counts the values that changed.
+template <typename TSource, typename TTarget>
+class VectorStore
+{
+public:
+    void Put(unsigned char* pTarget, MergeVector o) { StoreVector<TSource, TTarget>(pTarget, o); }
+    std::size_t Count() const { return 0; }
+};
+
+#if defined(__AVX512VBMI__)
+template <typename TSource, typename TTarget>
+requires(CAN_NARROW<TSource, TTarget>) class VectorStore<TSource, TTarget>
+{
+public:
+    void Put(unsigned char* pTarget, MergeVector o) { moChanged -= StoreNarrow<TSource, TTarget>(pTarget, o); }
+    std::size_t Count() const
+    {
+        std::size_t nCount = 0;
+        for (std::size_t n = 0; n < sizeof(MergeVector) / sizeof(TSource); ++n)
+            nCount += static_cast<std::size_t>(moChanged[n]);
+        return nCount;
+    }
+
+private:
+    decltype(StoreNarrow<TSource, TTarget>(nullptr, MergeVector())) moChanged = {};
+};
+#endif
+
 // As many terms as stay in registers.
 template <std::size_t N, typename TSource, typename TTarget>
-inline void MergeFew(const MergeTerm* pTerms, unsigned char* pTarget, std::size_t nPeriodBytes, std::size_t nPeriods)
+inline std::size_t MergeFew(const MergeTerm* pTerms, unsigned char* pTarget, std::size_t nPeriodBytes,
+                            std::size_t nPeriods)
 {
+    VectorStore<TSource, TTarget> oStore;
     const unsigned char* pSources[N];
     std::size_t nSteps[N];
     MergeShuffle oShuffles[N];
@@ -373,9 +474,10 @@ inline void MergeFew(const MergeTerm* pTerms, unsigned char* pTarget, std::size_
             oResult = AddTerm(oResult, LoadTerm(pSources[n]), oShuffles[n]);
             pSources[n] += nSteps[n];
         }
-        StoreVector<TSource, TTarget>(pTarget, oResult);
+        oStore.Put(pTarget, oResult);
         pTarget += nPeriodBytes;
     }
+    return oStore.Count();
 }
 
 // Brings channels of several sources together: each vector of the result is put together from one load of each source
@@ -385,8 +487,8 @@ inline void MergeFew(const MergeTerm* pTerms, unsigned char* pTarget, std::size_
 //     b   .  b0 .  .  b1 .  ..     or    a0 b0 c0 a1 b1 c1 ..    converted to the target's type as it is stored
 //     c   .  .  c0 .  .  c1 ..
 template <typename TSource, typename TTarget>
-void Merge(const MergeTerm* pTerms, std::size_t nTerms, unsigned char* pTarget, std::size_t nPeriodBytes,
-           std::size_t nPeriods)
+std::size_t Merge(const MergeTerm* pTerms, std::size_t nTerms, unsigned char* pTarget, std::size_t nPeriodBytes,
+                  std::size_t nPeriods)
 {
     switch (nTerms)
     {
@@ -398,9 +500,16 @@ void Merge(const MergeTerm* pTerms, std::size_t nTerms, unsigned char* pTarget, 
         return MergeFew<3, TSource, TTarget>(pTerms, pTarget, nPeriodBytes, nPeriods);
     case 4:
         return MergeFew<4, TSource, TTarget>(pTerms, pTarget, nPeriodBytes, nPeriods);
+#if defined(__AVX512VBMI__)
+    case 6:
+        return MergeFew<6, TSource, TTarget>(pTerms, pTarget, nPeriodBytes, nPeriods);
+    case 8:
+        return MergeFew<8, TSource, TTarget>(pTerms, pTarget, nPeriodBytes, nPeriods);
+#endif
     default:
         break;
     }
+    VectorStore<TSource, TTarget> oStore;
     for (std::size_t i = 0; i < nPeriods; ++i)
     {
         MergeVector oResult = {};
@@ -409,8 +518,9 @@ void Merge(const MergeTerm* pTerms, std::size_t nTerms, unsigned char* pTarget, 
             const MergeVector oLoad = LoadTerm(pTerms[n].mpSource + i * pTerms[n].mnPeriodBytes);
             oResult = AddTerm(oResult, oLoad, LoadShuffle(pTerms[n].mpShuffle));
         }
-        StoreVector<TSource, TTarget>(pTarget + i * nPeriodBytes, oResult);
+        oStore.Put(pTarget + i * nPeriodBytes, oResult);
     }
+    return oStore.Count();
 }
 
 constexpr std::size_t VECTOR_BYTES = sizeof(MergeVector);
@@ -427,6 +537,10 @@ constexpr MergeLoop FindMerge()
     using TTarget = std::tuple_element_t<NTarget, PartTypes>;
     if constexpr (CAN_STORE<TSource, TTarget>)
         return Merge<TSource, TTarget>;
+#if defined(__AVX512VBMI__)
+    else if constexpr (CAN_NARROW<TSource, TTarget>)
+        return Merge<TSource, TTarget>;
+#endif
 #endif
     return nullptr;
 }

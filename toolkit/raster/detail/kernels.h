@@ -31,9 +31,9 @@ struct MergeTerm
 };
 
 // Makes nPeriods vectors, each the union of its terms, 0 without any, and writes their values, converted, nPeriodBytes
-// apart.
-using MergeLoop = void (*)(const MergeTerm* pTerms, std::size_t nTerms, unsigned char* pTarget,
-                           std::size_t nPeriodBytes, std::size_t nPeriods);
+// apart. Returns how many of them changed, as ChangeCounter has it.
+using MergeLoop = std::size_t (*)(const MergeTerm* pTerms, std::size_t nTerms, unsigned char* pTarget,
+                                  std::size_t nPeriodBytes, std::size_t nPeriods);
 
 // The inner loops, compiled for one instruction set.
 struct Kernels
