@@ -43,7 +43,7 @@ private:
 class KeyPattern
 {
 public:
-    // Nothing for any other expression. The pattern is known to compile.
+    // Nothing for any other expression, those that do not compile among them.
     static std::optional<KeyPattern> Parse(const std::string& pattern, bool bCaseInsensitive);
 
     bool Search(std::string_view key) const;
