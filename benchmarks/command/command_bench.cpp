@@ -1,7 +1,7 @@
 // Measures the command line beside `vips` and `tiffcp`, whole processes on warm files, one thread each, the new files
 // safe on the disk by krv and left to the system to write by the others; a program that is not installed is left out.
-// Then two threads beside one, and beside `vips` and `cp` with `sync`.
-//     krv_bench_command FOLDER [--size N] [--only one|threads]
+// Then two threads beside one, and beside `vips` and `cp` with `sync`; and how long `krv info` takes of small files.
+//     krv_bench_command FOLDER [--size N] [--only one|threads|info]
 // FOLDER keeps the scenes for the next run.
 
 #include "benchmarks/support/arguments.h"
@@ -43,7 +43,7 @@ bool Run(const Words& oWords)
         waitpid(nChild, &nStatus, 0);
     const bool bMissing = nFault == ENOENT || (WIFEXITED(nStatus) && WEXITSTATUS(nStatus) == 127);
     if (!bMissing && (nFault != 0 || nStatus != 0))
-        throw std::runtime_error(oWords[0] + " " + oWords[1] + " failed");
+        throw std::runtime_error(oWords[0] + " failed with " + oWords.back());
     return !bMissing;
 }
 
@@ -166,11 +166,43 @@ void MeasureThreads(const std::string& krv, const std::string& plain, const std:
     std::filesystem::remove(levels);
 }
 
+// Beside an empty program that links what reads XML and reference systems: a process that has to load these.
+void MeasureInfo(const std::string& krv, const std::string& small, const std::string& place)
+{
+    PrintHeading("krv info of a small file");
+    std::filesystem::copy_file(small, place, std::filesystem::copy_options::overwrite_existing);
+    Run({krv, "edit", place, "--crs", "EPSG:32633", "--origin", "500000,5000000", "--pixel-size", "30"});
+    const auto oTimes = MedianSeconds({{"empty",
+                                        [&]
+                                        {
+                                            Run({krv + "_emptyprogram"});
+                                        }},
+                                       {"info",
+                                        [&]
+                                        {
+                                            Run({krv, "info", small});
+                                        }},
+                                       {"info of a place",
+                                        [&]
+                                        {
+                                            Run({krv, "info", place});
+                                        }}},
+                                      41);
+    const auto Row = [&](const char* pWhat, double nSeconds)
+    {
+        PrintRow(pWhat, oTimes[0] / nSeconds, 0.89,
+                 Number(nSeconds * 1000, 1) + " and " + Number(oTimes[0] * 1000, 1) + " ms");
+    };
+    Row("no reference system, against an empty program", oTimes[1]);
+    Row("in UTM, against an empty program", oTimes[2]);
+    std::filesystem::remove(place);
+}
+
 } // namespace
 
 int main(int nArguments, char** pArguments)
 {
-    const Arguments oArguments(nArguments, pArguments, "FOLDER [--size N] [--only one|threads]");
+    const Arguments oArguments(nArguments, pArguments, "FOLDER [--size N] [--only one|threads|info]");
     const std::string& folder = oArguments.GetWords().front();
     const unsigned int nSize = oArguments.GetNumber("size", 8192) / 512 * 512;
     std::filesystem::create_directories(folder);
@@ -186,6 +218,8 @@ int main(int nArguments, char** pArguments)
     const SceneKind oKind{"3x8U", 3, 8, false};
     const std::string plain = MakeScene(folder, oKind, "none", 256, nSize).moPath;
     const std::string zipped = MakeScene(folder, oKind, "deflate", 256, nSize).moPath;
+    if (oArguments.Wants("info"))
+        MeasureInfo(krv, MakeScene(folder, oKind, "deflate", 256, 512).moPath, Target("place"));
     if (oArguments.Wants("threads"))
         MeasureThreads(krv, plain, zipped, k);
     if (!oArguments.Wants("one"))

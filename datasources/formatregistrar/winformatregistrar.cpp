@@ -2,12 +2,12 @@
 
 #include "datasources/interfaces/formatplugin.h"
 #include "datasources/iomanager/datasetmanager.h"
-#include "datasources/iomanager/detail/ownlibrary.h"
+#include "datasources/iomanager/detail/description.h"
 #include "datasources/iomanager/detail/xmlsupport.h"
 #include "toolkit/core/core.h"
+#include "toolkit/core/ownlibrary.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/debugger.h"
-#include "toolkit/xml/limits.h"
 #include "toolkit/xml/xmltree.h"
 
 #include <algorithm>
@@ -45,14 +45,7 @@ krv::xml::Element ParseDescription(const std::string& path)
 {
     try
     {
-        std::error_code oError;
-        if (!std::filesystem::is_regular_file(path, oError))
-            throw krv::DataException(path + ": not a regular file");
-        std::ifstream oFile(path, std::ios::binary);
-        std::string text(
-            std::min<std::uintmax_t>(std::filesystem::file_size(path, oError), krv::xml::MAX_DOCUMENT_BYTES + 1), '\0');
-        oFile.read(text.data(), static_cast<std::streamsize>(text.size()));
-        return krv::xml::ParseTree(text.data(), static_cast<std::size_t>(oFile.gcount()), path);
+        return detail::ReadDescription(path);
     }
     catch (const krv::DataException&)
     {
@@ -65,13 +58,6 @@ krv::xml::Element ParseDescription(const std::string& path)
 bool IsRoot(const krv::xml::Element& oRoot, std::string_view name)
 {
     return oRoot.name == name && oRoot.FindAttribute("xmlns") == nullptr;
-}
-
-std::string Trimmed(const std::string& text)
-{
-    constexpr char WHITE[] = " \t\r\n";
-    const std::size_t nFirst = text.find_first_not_of(WHITE);
-    return nFirst == std::string::npos ? "" : text.substr(nFirst, text.find_last_not_of(WHITE) + 1 - nFirst);
 }
 
 // The system's message text is not used, intended: the fixed text keeps messages equal everywhere, and the loader's own
@@ -101,7 +87,7 @@ std::string GetFormatHome()
     const std::string home = IMPGetEnv("KRVHOME");
     if (!home.empty())
         return home;
-    const std::filesystem::path oLibrary = detail::OwnLibraryPath();
+    const std::filesystem::path oLibrary = krv::core::OwnLibraryPath(reinterpret_cast<const void*>(&FindEntryPoint));
     for (std::filesystem::path oFolder = oLibrary.parent_path(); oFolder != oFolder.root_path();
          oFolder = oFolder.parent_path())
     {
@@ -136,7 +122,7 @@ std::vector<std::string> ReadFormatRegistry(const std::string& path)
     for (const krv::xml::Element& oChild : oRoot.children)
     {
         if (IsRoot(oRoot, "Formats") && oChild.name == "Format")
-            oDescriptions.push_back(Trimmed(oChild.text));
+            oDescriptions.push_back(detail::Trimmed(oChild.text));
     }
     return oDescriptions;
 }
@@ -145,7 +131,7 @@ std::string ReadFormatObject(const std::string& path)
 {
     const krv::xml::Element oRoot = ParseDescription(path);
     const krv::xml::Element* const poObject = IsRoot(oRoot, "Format") ? oRoot.FindChild("Object") : nullptr;
-    return poObject != nullptr ? Trimmed(poObject->text) : std::string();
+    return poObject != nullptr ? detail::Trimmed(poObject->text) : std::string();
 }
 
 void RegisterFormatLibraries(DatasetManager* poManager)

@@ -1,26 +1,42 @@
 #include "datasources/metadata/regexmetadatafilter.h"
 
 #include "datasources/metadata/detail/keypattern.h"
+#include "datasources/metadata/detail/regexsupport.h"
+#include "toolkit/core/ownlibrary.h"
 
-#include <boost/regex.hpp>
-
-#include <locale>
 #include <optional>
 
 namespace krv::qrfutils
 {
 
+namespace
+{
+
+const detail::RegexSupport& Load()
+{
+    void* const pFunction = krv::core::LoadBesideOwn(reinterpret_cast<const void*>(&Load), KRV_REGEX_LIBRARY,
+                                                     detail::REGEX_SUPPORT_SYMBOL, "The library for expressions");
+    return *reinterpret_cast<const detail::RegexSupport* (*)()>(pFunction)();
+}
+
+const detail::RegexSupport& Support()
+{
+    static const detail::RegexSupport& oSupport = Load();
+    return oSupport;
+}
+
+} // namespace
+
 struct RegexMetadataFilter::Expression
 {
     Expression(const std::string& pattern, bool bCaseInsensitive)
+        : moPlain(detail::KeyPattern::Parse(pattern, bCaseInsensitive)),
+          mpoRegex(moPlain ? nullptr : Support().mpCompile(pattern, bCaseInsensitive))
     {
-        moRegex.imbue(std::locale::classic());
-        moRegex.assign(pattern, bCaseInsensitive ? boost::regex::perl | boost::regex::icase : boost::regex::perl);
-        moPlain = detail::KeyPattern::Parse(pattern, bCaseInsensitive);
     }
 
-    boost::regex moRegex;
     std::optional<detail::KeyPattern> moPlain;
+    std::shared_ptr<const void> mpoRegex; // where it is not plain
 };
 
 RegexMetadataFilter::RegexMetadataFilter(const std::string& pattern, bool bCaseInsensitive)
@@ -38,7 +54,7 @@ bool RegexMetadataFilter::operator()(const std::string& key, const std::string&)
 {
     if (const auto& oPlain = mpoExpression->moPlain)
         return oPlain->Search(key);
-    return boost::regex_search(key, mpoExpression->moRegex);
+    return Support().mpSearch(mpoExpression->mpoRegex.get(), key);
 }
 
 } // namespace krv::qrfutils

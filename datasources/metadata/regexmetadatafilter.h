@@ -13,7 +13,8 @@ namespace krv::qrfutils
 class KRV_DATASOURCES_API RegexMetadataFilter : public IMetadataFilter
 {
 public:
-    // Throws boost::regex_error for a pattern that does not compile.
+    // Throws boost::regex_error for a pattern that does not compile. Boost.Regex is loaded with the first pattern that
+    // is more than plain text between anchors and ".*": krv::LibraryException when it cannot be.
     RegexMetadataFilter(const std::string& pattern, bool bCaseInsensitive);
     RegexMetadataFilter(const RegexMetadataFilter& oOther);
     RegexMetadataFilter& operator=(const RegexMetadataFilter& oOther);

@@ -21,9 +21,11 @@
 #include "toolkit/threading/statestore.h"
 
 #include <algorithm>
+#include <atomic>
 #include <bit>
 #include <map>
 #include <numeric>
+#include <thread>
 #include <utility>
 
 namespace krv::datasources
@@ -47,6 +49,10 @@ constexpr unsigned int DEFAULT_SIZE = 256;
 // Windows of the image: no wider than this when they need not be, and no larger than so many bytes.
 constexpr std::uint64_t WINDOW_WIDTH = 4096;
 constexpr std::uint64_t WINDOW_BYTES = std::uint64_t{16} << 20;
+// Rows of windows that are reduced between looks at whether to stop: about so many bytes, and a multiple of the rows
+// that a cascade takes at once.
+constexpr std::size_t STRIP_BYTES = std::size_t{1} << 20;
+constexpr unsigned int STRIP_ROWS = 32;
 // Of windows that were read and wait.
 constexpr std::uint64_t MOST_AHEAD_BYTES = std::uint64_t{256} << 20;
 
@@ -98,6 +104,7 @@ private:
     std::vector<PixelBounds> ListWindows() const;
     static WindowPointer Read(IRasterReader& oReader, const SourceForm& oForm, const PixelBounds& oBounds);
     void Reduce(const krv::gobs::SourceWindow& oWindow);
+    void AddStrips(ILevelReducer& oReducer, const krv::gobs::SourceWindow& oWindow) const;
     void Take(const WindowPointer& poWindow, const PixelBounds& oBounds);
     void TakeAll(const std::vector<PixelBounds>& oWindows);
     void Ask() const;
@@ -121,6 +128,8 @@ private:
     unsigned int mnWindowWidth = 0;
     std::uint64_t mnDone = 0;
     std::uint64_t mnTotal = 0;
+    std::thread::id mnOwner = std::this_thread::get_id();
+    mutable std::atomic<bool> mbStopped = false;
 };
 
 OverviewBuilder::OverviewBuilder(IRasterWriter& oWriter, Resampling eMethod, const OverviewOptions& oOptions,
@@ -331,8 +340,16 @@ void OverviewBuilder::Line(std::function<void()> oWork, std::function<void()> oT
 
 void OverviewBuilder::Ask() const
 {
-    if (moOptions.moProgress && !moOptions.moProgress(mnDone, mnTotal))
-        throw Stopped();
+    try
+    {
+        if (moOptions.moProgress && !moOptions.moProgress(mnDone, mnTotal))
+            throw Stopped();
+    }
+    catch (...)
+    {
+        mbStopped = true;
+        throw;
+    }
 }
 
 // Row by row. They end with the rows of tiles, unless these are too high.
@@ -373,11 +390,38 @@ WindowPointer OverviewBuilder::Read(IRasterReader& oReader, const SourceForm& oF
 void OverviewBuilder::Reduce(const krv::gobs::SourceWindow& oWindow)
 {
     if (moReducers.size() == 1)
-        return moReducers.front()->Add(oWindow);
+        return AddStrips(*moReducers.front(), oWindow);
     krv::threading::TaskLine oLine(moThreads);
     for (const auto& poReducer : moReducers)
-        oLine.Add([&oWindow, &oReducer = *poReducer] { oReducer.Add(oWindow); }, {});
+        oLine.Add([this, &oWindow, &oReducer = *poReducer] { AddStrips(oReducer, oWindow); }, {});
     oLine.TakeAll();
+}
+
+// Windows of wide images take long: the thread that may ask does so now and then, the others see what came of it.
+void OverviewBuilder::AddStrips(ILevelReducer& oReducer, const krv::gobs::SourceWindow& oWindow) const
+{
+    const PixelBounds& oBounds = oWindow.moBounds;
+    const std::size_t nRowValues = std::size_t{oBounds.GetWidth()} * moForm.mnChannels;
+    const std::size_t nRowBytes = oBounds.GetWidth() * moForm.GetPixelBytes();
+    const unsigned int nRows =
+        std::max(static_cast<unsigned int>(STRIP_BYTES / nRowBytes) / STRIP_ROWS, 1u) * STRIP_ROWS;
+    krv::gobs::SourceWindow oStrip = oWindow;
+    for (unsigned int nY = oBounds.mnTop; nY < oBounds.mnBottom && !mbStopped; nY = oStrip.moBounds.mnBottom)
+    {
+        const std::size_t nFirst = nY - oBounds.mnTop;
+        oStrip.moBounds.mnTop = nY;
+        oStrip.moBounds.mnBottom = static_cast<unsigned int>(
+            std::min<std::uint64_t>(oBounds.mnBottom, (std::uint64_t{nY} / nRows + 1) * nRows));
+        oStrip.mpPixels = oWindow.mpPixels + nFirst * nRowBytes;
+        if (oWindow.mpValid != nullptr)
+        {
+            oStrip.mpValid = oWindow.mpValid + nFirst * nRowValues;
+            oStrip.mpRows = oWindow.mpRows + nFirst;
+        }
+        oReducer.Add(oStrip);
+        if (std::this_thread::get_id() == mnOwner)
+            Ask();
+    }
 }
 
 void OverviewBuilder::Take(const WindowPointer& poWindow, const PixelBounds& oBounds)

@@ -19,7 +19,6 @@ namespace krv::operations
 {
 
 using krv::ogc::cs::ControlPoint;
-using krv::ogc::cs::CoordinateTransformation;
 using krv::ogc::cs::GeocodingInfo;
 using krv::ogc::cs::ICRS;
 using krv::ogc::cs::PolynomialFit;
@@ -107,12 +106,12 @@ bool ImagePlace::ToRaster(double nX, double nY, double& nColumn, double& nRow) c
 
 std::optional<GeographicBounds> ImagePlace::FindGeographicBounds() const
 {
-    if (mpoCrs == nullptr || !krv::ogc::cs::CanBeComputed(*mpoCrs))
+    const auto oToDegrees = mpoCrs != nullptr ? krv::ogc::cs::FindWayToDegrees(*mpoCrs) : std::nullopt;
+    if (!oToDegrees)
         return std::nullopt;
-    const CoordinateTransformation oToDegrees(*mpoCrs, *krv::ogc::cs::CreateCRSFromEPSG(GEOGRAPHIC));
     const auto ToDegrees = [&](double nColumn, double nRow, double& nX, double& nY)
     {
-        return ToMap(nColumn, nRow, nX, nY) && oToDegrees.Transform(nX, nY) && std::fabs(nY) <= 90;
+        return ToMap(nColumn, nRow, nX, nY) && oToDegrees->Transform(nX, nY) && std::fabs(nY) <= 90;
     };
     double nCentre = 0, nUnused = 0;
     if (!ToDegrees(mnWidth / 2, mnHeight / 2, nCentre, nUnused))
@@ -138,7 +137,7 @@ std::optional<GeographicBounds> ImagePlace::FindGeographicBounds() const
     for (const double nPole : {90.0, -90.0})
     {
         double nX = 0, nY = nPole, nColumn = 0, nRow = 0;
-        const bool bInside = oToDegrees.TransformBack(nX, nY) && ToRaster(nX, nY, nColumn, nRow) && nColumn > 0 &&
+        const bool bInside = oToDegrees->TransformBack(nX, nY) && ToRaster(nX, nY, nColumn, nRow) && nColumn > 0 &&
                              nRow > 0 && nColumn < mnWidth && nRow < mnHeight;
         if (bInside)
             oBounds = {-180, std::min(oBounds.south, nPole), 180, std::max(oBounds.north, nPole)};

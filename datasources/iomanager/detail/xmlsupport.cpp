@@ -1,8 +1,6 @@
 #include "datasources/iomanager/detail/xmlsupport.h"
 
-#include "datasources/iomanager/detail/ownlibrary.h"
-#include "toolkit/core/core.h"
-#include "toolkit/exceptions/exceptions.h"
+#include "toolkit/core/ownlibrary.h"
 
 #include <link.h>
 
@@ -17,12 +15,8 @@ namespace
 const XmlSupport& Load()
 {
     const bool bOwn = !HasXerces();
-    const std::string library = OwnLibraryPath().parent_path() / KRV_XML_LIBRARY;
-    void* const pLibrary = IMPOpenLibrary(library);
-    void* const pFunction = pLibrary != nullptr ? IMPFindSymbol(pLibrary, XML_SUPPORT_SYMBOL) : nullptr;
-    if (pFunction == nullptr)
-        throw krv::LibraryException(library, krv::LibraryException::eLibraryNotFound,
-                                    "The library for XML cannot be loaded: " + IMPLibraryError());
+    void* const pFunction = krv::core::LoadBesideOwn(reinterpret_cast<const void*>(&Load), KRV_XML_LIBRARY,
+                                                     XML_SUPPORT_SYMBOL, "The library for XML");
     const XmlSupport& oSupport = *reinterpret_cast<const XmlSupport* (*)()>(pFunction)();
     // Started once for the process: questions come in numbers. It is not ended, since what was loaded while the program
     // ran is torn down before those who would end it.

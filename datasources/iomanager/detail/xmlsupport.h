@@ -7,7 +7,7 @@ namespace krv::datasources::detail
 
 // What the framework wants of Xerces and Xalan. These and what they need take longer to load than all else of a small
 // program's run, and a whole installation is read without them: what uses them is in libkrvxml, which is loaded when
-// an XPath is asked for, or a document is wrong and the parser's own exception has to say so.
+// an XPath is more than a way of names, or a document is wrong and the parser's own exception has to say so.
 struct XmlSupport
 {
     // As those of KRV_XMLUtil.

@@ -10,6 +10,8 @@ namespace
 {
 
 constexpr std::string_view SPECIAL = R"(.[{()\*+?|^$)";
+constexpr std::string_view NUMBER = "[0-9]+";
+constexpr std::string_view ESCAPED_NUMBER = R"(\[0-9]+)";
 
 constexpr std::array<unsigned char, 256> MakeFolding(bool bCaseInsensitive)
 {
@@ -148,6 +150,10 @@ std::optional<KeyPattern> KeyPattern::Parse(const std::string& pattern, bool bCa
     oParsed.mbLineEnd = rest.ends_with('$') && !rest.ends_with("\\$");
     if (oParsed.mbLineEnd)
         rest.remove_suffix(1);
+    oParsed.mbNumber =
+        oParsed.mbLineStart && oParsed.mbLineEnd && rest.ends_with(NUMBER) && !rest.ends_with(ESCAPED_NUMBER);
+    if (oParsed.mbNumber)
+        rest.remove_suffix(NUMBER.size());
     for (;;)
     {
         auto oText = TakeText(rest);
@@ -156,12 +162,31 @@ std::optional<KeyPattern> KeyPattern::Parse(const std::string& pattern, bool bCa
         oParsed.moSegments.emplace_back(std::move(*oText), bCaseInsensitive);
         if (rest.empty())
             return oParsed;
+        if (oParsed.mbNumber)
+            return std::nullopt;
         rest.remove_prefix(2);
     }
 }
 
+bool KeyPattern::SearchNumber(std::string_view key) const
+{
+    const KeySegment& oText = moSegments.front();
+    for (std::size_t nAt = 0; nAt <= key.size(); ++nAt)
+    {
+        if (!IsLineStart(key, nAt) || !oText.LiesAt(key, nAt))
+            continue;
+        const std::size_t nNumber = nAt + oText.GetLength();
+        const std::size_t nEnd = std::min(key.find_first_not_of("0123456789", nNumber), key.size());
+        if (nEnd > nNumber && IsLineEnd(key, nEnd))
+            return true;
+    }
+    return false;
+}
+
 bool KeyPattern::Search(std::string_view key) const
 {
+    if (mbNumber)
+        return SearchNumber(key);
     std::size_t nAt = 0;
     for (std::size_t n = 0; n < moSegments.size(); ++n)
     {

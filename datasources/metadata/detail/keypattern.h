@@ -25,9 +25,11 @@ public:
     // The end of the first occurrence that begins at nFrom or later, npos when there is none.
     std::size_t Find(std::string_view key, std::size_t nFrom, const Anchors& oAnchors) const;
 
+    bool LiesAt(std::string_view key, std::size_t nAt) const;
+    std::size_t GetLength() const { return moText.size(); }
+
 private:
     unsigned char Fold(char cByte) const { return (*mpoFolding)[static_cast<unsigned char>(cByte)]; }
-    bool LiesAt(std::string_view key, std::size_t nAt) const;
     // For a key of one line, where anchors leave one place.
     std::size_t FindInLine(std::string_view key, std::size_t nFrom, const Anchors& oAnchors) const;
     std::size_t FindAnywhere(std::string_view key, std::size_t nFrom, const Anchors& oAnchors) const;
@@ -38,20 +40,24 @@ private:
     const std::array<unsigned char, 256>* mpoFolding;
 };
 
-// The regular expressions that are plain text between anchors and ".*": the same answers as Boost.Regex gives for them
-// in its default Perl syntax, but without backtracking. Most filters are of this kind.
+// The regular expressions that are plain text between anchors and ".*", or the whole of "^text[0-9]+$": the same
+// answers as Boost.Regex gives for them in its default Perl syntax, but without backtracking. Most filters are of this
+// kind.
 class KeyPattern
 {
 public:
-    // Nothing for any other expression. The pattern is known to compile.
+    // Nothing for any other expression, those that do not compile among them.
     static std::optional<KeyPattern> Parse(const std::string& pattern, bool bCaseInsensitive);
 
     bool Search(std::string_view key) const;
 
 private:
+    bool SearchNumber(std::string_view key) const;
+
     std::vector<KeySegment> moSegments;
     bool mbLineStart = false;
     bool mbLineEnd = false;
+    bool mbNumber = false; // between the only segment and the line's end
 };
 
 } // namespace krv::qrfutils::detail

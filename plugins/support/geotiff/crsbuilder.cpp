@@ -197,7 +197,7 @@ private:
         if (!moDefinition || bCode || IsBaseDefinition())
             return nullptr;
         const bool bSaidByKeys = moKeys.FindCode(ProjectionGeoKey) != 0 || moKeys.FindCode(ProjCoordTransGeoKey) != 0;
-        if (bSaidByKeys && !(moDefinition->system && CanBeComputed(*moDefinition->system)))
+        if (bSaidByKeys && !(moDefinition->system && FindWayToDegrees(*moDefinition->system)))
             return nullptr;
         if (moDefinition->system)
             return CRS(moDefinition->system->Clone());

@@ -54,6 +54,33 @@ TEST(FormatCapabilities, Limits)
         EXPECT_EQ(oCapabilities.GetLimit(std::string("/Format/Capabilities/Limits/") + pName), nLimit) << pName;
 }
 
+// What a plain XPath finds without the XML libraries is what they find by one that says the same in other words.
+TEST(FormatCapabilities, PlainQuestionsAreAnsweredAsAllAre)
+{
+    const krv::conformance::TempFolder oFolder;
+    const char* const DOCUMENTS[] = {
+        "<F><L>1</L><L>2</L></F>",
+        "<F><C/><C><D/><L>3</L></C><C><L>4</L></C><L/></F>",
+        "<F xmlns='urn:a'><L>5</L></F>",
+        "<F><x:L xmlns:x='urn:a'>6</x:L></F>",
+        "<F><x:L>7</x:L></F>",
+        "<F><C><L> <!-- 8 -->9<![CDATA[0]]>&#49;\t\n</L></C><L>1<D>2</D></L></F>",
+        "<!DOCTYPE F [<!ENTITY e '10'>]><F><L>&e;</L></F>",
+        "<F><L a='1' a='2'>11</L></F>",
+        "<G><F><L>12</L></F></G>",
+    };
+    for (const char* const pDocument : DOCUMENTS)
+    {
+        const FormatCapabilities oCapabilities(oFolder.Write("format.xml", pDocument));
+        for (const std::string path : {"/F", "/F/L", "/F/C", "/F/C/L", "/F/C/D", "/F/M", "/G/F/L"})
+        {
+            EXPECT_EQ(oCapabilities.IsSupported(path), oCapabilities.IsSupported(path + "[true()]"))
+                << pDocument << path;
+            EXPECT_EQ(oCapabilities.GetLimit(path), oCapabilities.GetLimit(path + "[true()]")) << pDocument << path;
+        }
+    }
+}
+
 TEST(FormatCapabilities, FailuresAreDebugOutputAndNo)
 {
     const krv::conformance::TempFolder oFolder;

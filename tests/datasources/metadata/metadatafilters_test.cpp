@@ -160,7 +160,7 @@ TEST(MetadataFilters, CategoriesSelectTheirTags)
 
 TEST(MetadataFilters, PlainExpressionsAnswerAsBoostDoes)
 {
-    const std::string KEYS("aAbB_.\\\n\r\f\0\xE4\xC4]}", 15);
+    const std::string KEYS("aAbB_.\\\n\r\f\0\xE4\xC4]}17", 17);
     const std::string PIECES[] = {"a", "B", "_", ".*", ".*", "\\.", "\\\\", "\\$", "\n", "\r", "\xC4", "ab", "]", "}"};
     const unsigned int nSeed = 20240607;
     std::mt19937 oRandom(nSeed);
@@ -169,6 +169,7 @@ TEST(MetadataFilters, PlainExpressionsAnswerAsBoostDoes)
         std::string pattern = oRandom() % 2 == 0 ? "^" : "";
         for (std::size_t n = oRandom() % 5; n > 0; --n)
             pattern += PIECES[oRandom() % std::size(PIECES)];
+        pattern += oRandom() % 4 == 0 ? "[0-9]+" : "";
         pattern += oRandom() % 2 == 0 ? "$" : "";
         const bool bFold = oRandom() % 2 == 0;
         const RegexMetadataFilter oFilter(pattern, bFold);

@@ -78,7 +78,7 @@ bool CoordinateTransformation::TransformBack(double& nX, double& nY) const
     return TransformBack(1, &nX, &nY) == 1;
 }
 
-bool CanBeComputed(const ICRS& oCRS)
+std::optional<CoordinateTransformation> FindWayToDegrees(const ICRS& oCRS)
 {
     constexpr int EPSG_WGS84 = 4326;
     double nX = 0.0;
@@ -90,13 +90,15 @@ bool CanBeComputed(const ICRS& oCRS)
             nY = oParameter.value;
     try
     {
-        return CoordinateTransformation(oCRS, *CreateCRSFromEPSG(EPSG_WGS84)).Transform(nX, nY) &&
-               std::abs(nX) <= 360.0 && std::abs(nY) <= 90.0;
+        CoordinateTransformation oWay(oCRS, *CreateCRSFromEPSG(EPSG_WGS84));
+        if (oWay.Transform(nX, nY) && std::abs(nX) <= 360.0 && std::abs(nY) <= 90.0)
+            return oWay;
     }
     catch (const krv::DataException&)
     {
-        return false;
+        // None, as for positions that come out nowhere.
     }
+    return std::nullopt;
 }
 
 } // namespace krv::ogc::cs

@@ -6,6 +6,7 @@
 
 #include <cstddef>
 #include <memory>
+#include <optional>
 
 namespace krv::ogc::cs
 {
@@ -38,8 +39,9 @@ private:
     std::unique_ptr<Parts> mpoParts;
 };
 
-// Whether positions of a system can be brought to longitude and latitude. Definitions of projections that nobody knows
-// are taken as they stand; nothing can be computed by them, not even where the false origin lies.
-KRV_TOOLKIT_API bool CanBeComputed(const ICRS& oCRS);
+// The way from positions of a system to longitude and latitude in degrees of WGS 84, or none. Definitions of
+// projections that nobody knows are taken as they stand; nothing can be computed by them, not even where the false
+// origin lies.
+KRV_TOOLKIT_API std::optional<CoordinateTransformation> FindWayToDegrees(const ICRS& oCRS);
 
 } // namespace krv::ogc::cs
