@@ -31,6 +31,7 @@
 
 #include <algorithm>
 #include <array>
+#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <functional>
@@ -400,6 +401,7 @@ void AskPlugin(const std::string& file, const LoadedPlugin& oPlugin, const Heade
 
 std::string DescribeUnknown(const std::string& file)
 {
+    constexpr std::string_view ENVI = "ENVI";
     Header oHeader{};
     const std::string kind = GuessFileKind(oHeader.data(), ReadHeader(file, oHeader));
     if (!kind.empty())
@@ -413,6 +415,13 @@ std::string DescribeUnknown(const std::string& file)
                 "the header {} beside it is of a kind that is not read: write an ENVI header {}.hdr with "
                 "its size and data type",
                 header, file);
+    }
+    for (const std::string& header : {file + ".hdr", stem + ".hdr"})
+    {
+        std::error_code oNone;
+        const std::size_t nBytes = std::filesystem::is_regular_file(header, oNone) ? ReadHeader(header, oHeader) : 0;
+        if (nBytes >= ENVI.size() && std::memcmp(oHeader.data(), ENVI.data(), ENVI.size()) == 0)
+            return fmt::format("the ENVI header {} beside it tells of a file of another size, or is no text", header);
     }
     return {};
 }
@@ -439,7 +448,9 @@ std::vector<Finding> CheckFile(const std::string& file, const std::vector<Loaded
         oFindings.push_back({false, "file " + file, "no format recognises it: " + seems, {}});
     else if (!bRecognised)
         oFindings.push_back({false, "file " + file, "no format recognises it",
-                             "install the plug-in of its format, or convert it to one that `krv formats` lists"});
+                             "install the plug-in of its format, or convert it to one that `krv formats` lists; where "
+                             "it holds plain pixels, which no header beside it describes, write an ENVI header " +
+                                 file + ".hdr with their size, data type and byte order"});
     return oFindings;
 }
 
