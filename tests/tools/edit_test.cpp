@@ -219,10 +219,10 @@ TEST_F(EditCommand, ClientsOfCloudFilesFindWhatTheyArePromised)
 TEST_F(EditCommand, MasksOfCloudFilesStandBehindTheirBlocks)
 {
     const std::string masked = Copy("masked.tif", "COMPRESS=DEFLATE"), file = moFolder.File("cog.tif");
-    ASSERT_EQ(
-        RunKrv({"mask", masked, "--polygon", "POLYGON((0 0,600 0,600 600,100 600,0 0))", "--coordinates", "pixel", "--validity"})
-            .code,
-        0);
+    ASSERT_EQ(RunKrv({"mask", masked, "--polygon", "POLYGON((0 0,600 0,600 600,100 600,0 0))", "--coordinates", "pixel",
+                      "--validity"})
+                  .code,
+              0);
     ASSERT_EQ(
         RunKrv({"convert", masked, file, "--options", "LAYOUT=COG COMPRESS=DEFLATE BLOCKXSIZE=512 BLOCKYSIZE=512"})
             .errors,
