@@ -264,7 +264,8 @@ std::vector<unsigned int> SourceFile::CheckChannels(const std::vector<unsigned i
     {
         if (nChannel == 0 || nChannel > nCount)
             throw RequestException(
-                fmt::format("{}: there is no channel {}; its channels are 1 to {}", moName, nChannel, nCount));
+                fmt::format("{}: there is no channel {}; {}", moName, nChannel,
+                            nCount == 1 ? "it has one" : fmt::format("its channels are 1 to {}", nCount)));
     }
     return oResult;
 }

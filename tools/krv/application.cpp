@@ -12,6 +12,7 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <cstring>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -127,9 +128,12 @@ std::string DescribeMistake(const CLI::App* poApp, const CLI::Error& oError)
     const auto oUsed = poApp->get_subcommands();
     const CLI::App& oVerb = oUsed.empty() ? *poApp : *oUsed.front();
     const std::size_t nTwice = text.find(": At Most 1 required but received");
+    const std::size_t nFew = text.find(": At least ");
     const std::size_t nUnknown = text.rfind(" --");
     if (nTwice != std::string::npos)
         text.replace(nTwice, std::string::npos, " is given more than once");
+    else if (nFew != std::string::npos)
+        text = "too few " + text.substr(0, nFew) + ": at least " + text.substr(nFew + std::strlen(": At least "));
     else if (dynamic_cast<const CLI::ExtrasError*>(&oError) != nullptr && nUnknown != std::string::npos)
     {
         std::vector<std::string> oNames;

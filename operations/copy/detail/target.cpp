@@ -141,7 +141,7 @@ void Target::MakeByUser(const TargetForm& oForm, const std::string& options)
     catch (const krv::DataException& oError)
     {
         if (bMixed)
-            throw krv::DataException(oError.GetMessage() + " (--type gives all channels one type)");
+            throw RequestException(oError.GetMessage() + " (--type gives all channels one type)");
         if (oForm.options.empty())
             throw;
         throw RequestException(
