@@ -5,7 +5,7 @@ KRV_ROOT=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd)
 cd "$KRV_ROOT"
 
 # What each job needs, as Debian 12 packages.
-KRV_PACKAGES_BUILD=(g++ cmake ninja-build pkg-config
+KRV_PACKAGES_BUILD=(g++ cmake ninja-build make pkg-config
     libxerces-c-dev libxalan-c-dev libexpat1-dev libboost-regex-dev libproj-dev proj-data
     libtiff-dev libgeotiff-dev libjpeg62-turbo-dev libdeflate-dev libisal-dev libzstd-dev liblz4-dev zlib1g-dev libopenjp2-7-dev
     libcli11-dev libfmt-dev nlohmann-json3-dev libpng-dev libvips-dev)

@@ -1,4 +1,4 @@
-// Smooths the first channel of an 8-bit scene on all cores, without seams; Ctrl-C stops it and leaves nothing.
+// filterscene SCENE RESULT: smooths the first 8-bit channel on all cores, without seams; Ctrl-C leaves nothing.
 #include <csignal>
 #include <iostream>
 #include <krv/krv.h>

@@ -403,7 +403,10 @@ std::string DescribeUnknown(const std::string& file)
 {
     constexpr std::string_view ENVI = "ENVI";
     Header oHeader{};
-    const std::string kind = GuessFileKind(oHeader.data(), ReadHeader(file, oHeader));
+    const auto nRead = ReadHeader(file, oHeader);
+    if (nRead == 0)
+        return "it is empty";
+    const std::string kind = GuessFileKind(oHeader.data(), nRead);
     if (!kind.empty())
         return "it begins like " + kind;
     const std::string stem = std::filesystem::path(file).replace_extension().string();

@@ -7,16 +7,19 @@
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/metadata/droppedtags.h"
 #include "datasources/metadata/typednodata.h"
+#include "gobs/mask/samplematch.h"
 #include "operations/job/exceptions.h"
 #include "operations/source/referencesystem.h"
 #include "operations/source/sourcefile.h"
 #include "toolkit/core/lettercase.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/warning.h"
 
 #include <fmt/format.h>
 
 #include <algorithm>
 #include <memory>
+#include <set>
 
 namespace krv::operations
 {
@@ -62,6 +65,11 @@ public:
     const AuxiliaryData& Get() const { return moRecord; }
 
     // Channel 0 is the file.
+    bool Has(unsigned int nChannel, const std::string& key) const
+    {
+        return (nChannel == 0 ? moRecord.GetFileMetadata() : moRecord.GetChanMetadata(nChannel)).contains(key);
+    }
+
     void Set(unsigned int nChannel, const std::string& key, const std::string& value)
     {
         if (nChannel == 0 && !value.empty())
@@ -99,7 +107,7 @@ public:
                          [&](const char* pColour) { return krv::ToUpper(pColour) == krv::ToUpper(name); });
         if (!name.empty() && pFound == std::end(COLOURS))
             throw RequestException(
-                fmt::format("\"{}\" is nothing that a channel shows; there are {}", name, fmt::join(COLOURS, ", ")));
+                fmt::format("\"{}\" is none of what a channel can show: {}", name, fmt::join(COLOURS, ", ")));
         Set(nChannel, COLOUR, name.empty() ? name : *pFound);
     }
 
@@ -167,7 +175,7 @@ struct NewPlace
 GeocodingInfo PlaceOn(const PlacedBounds& oBounds, const SourceFile& oFile)
 {
     if (!(oBounds.west < oBounds.east) || !(oBounds.south < oBounds.north))
-        throw RequestException("the bounds are not west,south,east,north");
+        throw RequestException("the bounds are west,south,east,north: west is to be below east, south below north");
     const auto& oRaster = oFile.GetRaster();
     return {oBounds.west,
             (oBounds.east - oBounds.west) / oRaster.GetWidth(),
@@ -211,6 +219,22 @@ NewPlace FindPlace(const SourceFile& oFile, const SourceFile* poOther, const Edi
     return oPlace;
 }
 
+// A value that no pixel can have is stored all the same: it may be meant for another reader.
+void WarnOfNoData(const SourceFile& oFile, const std::string& text, const std::vector<unsigned int>& oChannels)
+{
+    const auto oValue = krv::datasources::ParseNoData(text);
+    for (const unsigned int nChannel : oFile.CheckChannels(oChannels))
+    {
+        const krv::gobs::DataType oType = oFile.GetType(nChannel);
+        unsigned char aSample[16] = {};
+        if (!oValue || oType.GetBits() == 1 || krv::gobs::StoreSample(*oValue, oType, aSample))
+            continue;
+        return krv::nspio::Warning::Warn(fmt::format("{}: no pixel of channel {} can have the no-data value {}: its "
+                                                     "type is {}",
+                                                     oFile.GetName(), nChannel, text, oType.Describe()));
+    }
+}
+
 void EditRecord(Record& oRecord, const SourceFile& oFile, const SourceFile* poOther, const EditRequest& oRequest)
 {
     const std::vector<unsigned int> oChannels =
@@ -221,6 +245,7 @@ void EditRecord(Record& oRecord, const SourceFile& oFile, const SourceFile* poOt
     {
         if (!oRequest.noData->empty() && !krv::datasources::ParseNoData(*oRequest.noData))
             throw RequestException(fmt::format("the no-data value \"{}\" is no number", *oRequest.noData));
+        WarnOfNoData(oFile, *oRequest.noData, oChannels);
         oRecord.SetNoData(*oRequest.noData, oChannels);
     }
     for (const TagEdit& oTag : oRequest.tags)
@@ -228,7 +253,11 @@ void EditRecord(Record& oRecord, const SourceFile& oFile, const SourceFile* poOt
         if (oTag.key.empty())
             throw RequestException("a tag has a name in front of its value");
         for (const unsigned int nChannel : oChannels.empty() ? std::vector<unsigned int>{0} : oChannels)
+        {
+            if (!oTag.value && !oRecord.Has(nChannel, oTag.key))
+                krv::nspio::Warning::Warn(fmt::format("{}: there is no tag {} to remove", oFile.GetName(), oTag.key));
             oRecord.Set(nChannel, oTag.key, oTag.value.value_or(""));
+        }
     }
     for (const auto& [nChannel, text] : oRequest.descriptions)
         oRecord.SetDescription(nChannel, text);
@@ -243,25 +272,43 @@ void EditRecord(Record& oRecord, const SourceFile& oFile, const SourceFile* poOt
     }
 }
 
-// Keys without a value are as good as absent.
-bool IsSame(const MetadataMap& oOne, const MetadataMap& oOther)
+// What a user calls that which a key says.
+const char* KindOf(const std::string& key)
 {
-    const auto Holds = [](const MetadataMap& oMap, const auto& oEntry)
-    {
-        const auto oFound = oMap.find(oEntry.first);
-        return oFound != oMap.end() ? oFound->second == oEntry.second : oEntry.second.empty();
-    };
-    return std::all_of(oOne.begin(), oOne.end(), [&](const auto& oEntry) { return Holds(oOther, oEntry); }) &&
-           std::all_of(oOther.begin(), oOther.end(), [&](const auto& oEntry) { return Holds(oOne, oEntry); });
+    if (krv::ToUpper(key) == NO_DATA)
+        return "no-data";
+    if (krv::ToUpper(key).starts_with("STATISTICS_"))
+        return "statistics";
+    if (IsAmong(key, {COLOUR}))
+        return "colours";
+    return IsAmong(key, DISPLAY) ? "display" : IsAmong(key, PLACES) ? "geocoding" : "tags";
 }
 
-bool IsSame(const AuxiliaryData& oOne, const AuxiliaryData& oOther)
+// Keys without a value are as good as absent.
+void AddMissing(const MetadataMap& oOne, const MetadataMap& oOther, std::set<std::string>& oKinds)
 {
+    for (const auto& [key, value] : oOne)
+    {
+        const auto oFound = oOther.find(key);
+        if (oFound != oOther.end() ? oFound->second != value : !value.empty())
+            oKinds.insert(KindOf(key));
+    }
+}
+
+// In what two records differ.
+std::set<std::string> ListDifferences(const AuxiliaryData& oOne, const AuxiliaryData& oOther)
+{
+    std::set<std::string> oKinds;
+    AddMissing(oOne.GetFileMetadata(), oOther.GetFileMetadata(), oKinds);
+    AddMissing(oOther.GetFileMetadata(), oOne.GetFileMetadata(), oKinds);
     for (unsigned int i = 1; i <= oOne.GetChannelCount(); ++i)
-        if (!IsSame(oOne.GetChanMetadata(i), oOther.GetChanMetadata(i)) ||
-            oOne.GetChannelDescription(i) != oOther.GetChannelDescription(i))
-            return false;
-    return IsSame(oOne.GetFileMetadata(), oOther.GetFileMetadata());
+    {
+        AddMissing(oOne.GetChanMetadata(i), oOther.GetChanMetadata(i), oKinds);
+        AddMissing(oOther.GetChanMetadata(i), oOne.GetChanMetadata(i), oKinds);
+        if (oOne.GetChannelDescription(i) != oOther.GetChannelDescription(i))
+            oKinds.insert("descriptions");
+    }
+    return oKinds;
 }
 
 template <class Facet>
@@ -270,7 +317,7 @@ Facet& Require(const SourceFile& oFile, const char* pWhat)
     auto* const poFacet = dynamic_cast<Facet*>(&oFile.GetDataset());
     if (poFacet == nullptr)
         throw krv::DataException(
-            fmt::format("{}: {} of a file of this format; convert it to TIF first", oFile.GetName(), pWhat));
+            fmt::format("{}: {} in a file of this format; convert it to TIF first", oFile.GetName(), pWhat));
     return *poFacet;
 }
 
@@ -317,21 +364,19 @@ EditResult EditFile(const std::string& file, const EditRequest& oRequest)
     const auto oAll = oFile.CheckChannels({});
     if (std::any_of(oAll.begin(), oAll.end(), HasOtherNoData))
     {
-        oResult.changed.emplace_back("no-data");
         oRecord.ForgetStatistics();
         const std::unique_ptr<krv::datasources::IOverviewManager> poLevels(oFile.GetRaster().GetOverviewManager());
         oResult.levels = poLevels != nullptr && !poLevels->GetLevels().empty();
     }
     // The record comes first: it may hold control points, which a geocoding takes the place of.
-    if (!IsSame(oRecord.Get(), oFile.GetMetadata()))
-    {
+    std::set<std::string> oKinds = ListDifferences(oRecord.Get(), oFile.GetMetadata());
+    if (!oKinds.empty())
         oFile.GetDataset().WriteAuxiliaryData(oRecord.Get());
-        oResult.changed.emplace_back("record");
-    }
     if (oPlace.crs && StoreCrs(oFile, *oPlace.crs))
-        oResult.changed.emplace_back("crs");
+        oKinds.insert("crs");
     if (oPlace.geocoding && StoreGeocoding(oFile, *oPlace.geocoding))
-        oResult.changed.emplace_back("geocoding");
+        oKinds.insert("geocoding");
+    oResult.changed.assign(oKinds.begin(), oKinds.end());
     oFile.GetDataset().Close();
     return oResult;
 }

@@ -59,8 +59,8 @@ struct EditRequest
     std::optional<std::vector<unsigned int>> display;
 };
 
-// Words for what was changed: "no-data" (values count otherwise than before: stored statistics went, levels are of
-// before), "record" (any tag), "crs", "geocoding".
+// Words for what was changed: those of the parts above, and "statistics" for stored ones, which go with the no-data
+// value that they were made by.
 struct EditResult
 {
     std::vector<std::string> changed; // empty: the file said all of it before and was not written

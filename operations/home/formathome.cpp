@@ -64,11 +64,23 @@ std::string Trim(const std::string& text)
                                        : text.substr(nFirst, text.find_last_not_of(BLANKS) - nFirst + 1);
 }
 
+krv::xml::Element ParseRegistry(const fs::path& oPath)
+{
+    const std::string text = ReadAll(oPath);
+    try
+    {
+        return krv::xml::ParseTree(text.data(), text.size(), oPath.string());
+    }
+    catch (const krv::DataException& oError)
+    {
+        throw krv::DataException(oError.GetMessage() + "; mend this registry, or remove it to make it anew");
+    }
+}
+
 // The descriptions that a registry lists.
 std::vector<std::string> ReadRegistry(const fs::path& oPath)
 {
-    const std::string text = ReadAll(oPath);
-    const krv::xml::Element oRoot = krv::xml::ParseTree(text.data(), text.size(), oPath.string());
+    const krv::xml::Element oRoot = ParseRegistry(oPath);
     std::vector<std::string> oEntries;
     for (const krv::xml::Element& oChild : oRoot.children)
         if (oRoot.name == "Formats" && oChild.name == "Format" && !Trim(oChild.text).empty())

@@ -101,7 +101,7 @@ void CheckBitmap(const SourceFile& oFile, unsigned int nBitmap)
     if (std::find(oList.begin(), oList.end(), nBitmap) == oList.end())
         throw RequestException(
             fmt::format("{}: there is no bitmap {}; {}", oFile.GetName(), nBitmap,
-                        oList.empty() ? "there are none" : fmt::format("there are {}", fmt::join(oList, ", "))));
+                        oList.empty() ? "the file has none" : fmt::format("there are {}", fmt::join(oList, ", "))));
 }
 
 template <typename Operation>

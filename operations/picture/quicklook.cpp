@@ -3,6 +3,7 @@
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/irasterdataset.h"
+#include "datasources/metadata/classnames.h"
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/derived/pctrasterreader.h"
 #include "datasources/reader/derived/totalpowerrasterreader.h"
@@ -19,12 +20,15 @@
 #include <cmath>
 #include <memory>
 #include <optional>
+#include <set>
 
 namespace krv::operations
 {
 
 namespace
 {
+
+constexpr char UNIT_TAG[] = "UnitType";
 
 struct Size
 {
@@ -285,17 +289,41 @@ bool ShowsPower(const SourceFile& oFile, const QuickLookOptions& oOptions, const
                               oFile.GetType(oChoice.channels.front()).IsComplex());
 }
 
-void AddLegend(const SourceFile& oFile, QuickLook& oLook)
+std::string FindUnit(const SourceFile& oFile, const QuickLook& oLook)
+{
+    const auto& oMetadata = oFile.GetMetadata();
+    const unsigned int nChannel = oLook.choice.channels.front();
+    if (oLook.decibels)
+        return "dB";
+    return oLook.power || nChannel > oMetadata.GetChannelCount() ? std::string()
+                                                                 : oMetadata.GetChanMetadataValue(UNIT_TAG, nChannel);
+}
+
+// The values that a picture of a colour table shows.
+std::set<double> ListValues(const SourceFile& oFile, const QuickLook& oLook, const Threads& oThreads)
+{
+    const Size oSize{oLook.picture.width, oLook.picture.height};
+    const Plane oPlane = ReadPlanes(oFile, oLook.choice.channels, oSize, Resampling::eNearest, oThreads).front();
+    std::set<double> oValues;
+    for (std::size_t i = 0; i < oPlane.values.size(); ++i)
+        if (oPlane.coverage[i] > 0)
+            oValues.insert(oPlane.values[i]);
+    return oValues;
+}
+
+void AddLegend(const SourceFile& oFile, QuickLook& oLook, const Threads& oThreads)
 {
     const DisplayChoice& oChoice = oLook.choice;
     if (oChoice.table != nullptr)
-        return AddColourLegend(*oChoice.table, oLook.picture);
+        return AddColourLegend(*oChoice.table, ListValues(oFile, oLook, oThreads),
+                               krv::datasources::GetClassNames(oFile.GetMetadata(), oChoice.channels.front()),
+                               oLook.picture);
     if (oLook.stretches.size() != 1)
-        throw RequestException("a legend is of one channel; name it");
+        throw RequestException("a legend is of one channel, and three are shown; choose one (--channels 1)");
     const ValueScale oScale = oLook.decibels || oLook.power ? ValueScale() : oFile.GetScale(oChoice.channels.front());
     const Stretch& oStretch = oLook.stretches.front();
     const double nLow = oScale(oStretch.low), nHigh = oScale(oStretch.high);
-    AddGreyLegend(nLow, nHigh, oChoice.inverted, oLook.picture);
+    AddGreyLegend(nLow, nHigh, FindUnit(oFile, oLook), oChoice.inverted, oLook.picture);
 }
 
 } // namespace
@@ -316,7 +344,7 @@ QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOption
         PaintColours(oLook.picture, ReadColours(oFile, oChoice, oSize, oThreads));
         DropOpaqueAlpha(oLook.picture);
         if (oOptions.legend)
-            AddLegend(oFile, oLook);
+            AddLegend(oFile, oLook, oThreads);
         return oLook;
     }
     oLook.power = ShowsPower(oFile, oOptions, oChoice);
@@ -343,7 +371,7 @@ QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOption
     PaintOpacity(oLook.picture, oOpacity);
     DropOpaqueAlpha(oLook.picture);
     if (oOptions.legend)
-        AddLegend(oFile, oLook);
+        AddLegend(oFile, oLook, oThreads);
     return oLook;
 }
 

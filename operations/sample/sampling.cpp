@@ -73,7 +73,8 @@ Placer MakePlacer(const SourceFile& oFile, const SampleRequest& oRequest, Sample
             return true;
         };
     if (!oPlace)
-        throw RequestException(oFile.GetName() + ": it does not say where it lies; give pixels");
+        throw RequestException(
+            oFile.GetName() + ": the file does not say where it lies; give the points in pixels (--coordinates pixel)");
     oResult.placedBy = oPlace->GetKind();
     if (!bNamed)
         return PlaceIn(*oPlace);

@@ -2,6 +2,7 @@
 
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/droppedtags.h"
@@ -58,7 +59,7 @@ std::unique_ptr<krv::datasources::IDataset> OpenDataset(const std::string& name,
 std::string LevelList(const IOverviewReaderAccessor& oAccessor)
 {
     const auto oLevels = oAccessor.GetLevels();
-    return oLevels.empty() ? "there are none" : fmt::format("there are {}", fmt::join(oLevels, ", "));
+    return oLevels.empty() ? "the file has none" : fmt::format("there are {}", fmt::join(oLevels, ", "));
 }
 
 bool Has(const IOverviewReaderAccessor& oAccessor, unsigned int nLevel)
@@ -207,7 +208,9 @@ krv::gobs::DataType SourceFile::GetType(unsigned int nChannel) const
 
 bool SourceFile::IsIdentityPlace(bool bHasCrs) const
 {
-    return bHasCrs && moMetadata.GetFileMetadataValue("GroundControlPoints").empty() &&
+    const auto* const poModels = dynamic_cast<const krv::datasources::IMathModelDataset*>(&GetDataset());
+    return bHasCrs && (poModels == nullptr || !poModels->HasMathModel()) &&
+           moMetadata.GetFileMetadataValue("GroundControlPoints").empty() &&
            moMetadata.GetFileMetadataValue("map info").empty();
 }
 
@@ -261,7 +264,8 @@ std::vector<unsigned int> SourceFile::CheckChannels(const std::vector<unsigned i
     {
         if (nChannel == 0 || nChannel > nCount)
             throw RequestException(
-                fmt::format("{}: there is no channel {}; its channels are 1 to {}", moName, nChannel, nCount));
+                fmt::format("{}: there is no channel {}; {}", moName, nChannel,
+                            nCount == 1 ? "it has one" : fmt::format("its channels are 1 to {}", nCount)));
     }
     return oResult;
 }
@@ -305,7 +309,7 @@ LevelReader SourceFile::Read(const std::vector<unsigned int>& oChannels, unsigne
     std::unique_ptr<IOverviewReaderAccessor> poAccessor(poFull->GetOverviewReaderAccessor());
     if (poAccessor == nullptr || !Has(*poAccessor, nLevel))
         throw RequestException(fmt::format("{}: there is no level {}; {}", moName, nLevel,
-                                           poAccessor == nullptr ? "there are none" : LevelList(*poAccessor)));
+                                           poAccessor == nullptr ? "the file has none" : LevelList(*poAccessor)));
     std::unique_ptr<IRasterReader> poLevel(poAccessor->CreateRasterReader(nLevel));
     return {std::move(poFull), std::move(poAccessor), std::move(poLevel)};
 }

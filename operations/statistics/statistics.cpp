@@ -756,7 +756,8 @@ std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile, const 
                     [](double nPercent) { return !(nPercent >= 0 && nPercent <= 100); }))
         throw RequestException("percentiles lie between 0 and 100");
     if (oRequest.power && (oRequest.bins != 0 || !oRequest.percentiles.empty()))
-        throw RequestException("a histogram and percentiles of the power take a file of it: krv convert --power");
+        throw RequestException(
+            "histograms and percentiles of the power need a file that holds it; make one with krv convert --power");
     if (oRequest.power)
         return PowerStatistics(oFile, oRequest, oProgress, poExecutor);
     const auto oChannels = oFile.CheckChannels(oRequest.channels);

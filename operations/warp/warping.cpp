@@ -146,6 +146,15 @@ Grid MakeGrid(const WarpRequest& oRequest, const SourceFile& oFile, const Geocod
     return oGrid;
 }
 
+void WarnOfMiss(const SourceFile& oFile, const GeocodingInfo& oPlace, const Grid& oGrid)
+{
+    const MapBounds oImage = OutlineOf(oPlace, oFile.GetRaster().GetWidth(), oFile.GetRaster().GetHeight());
+    const MapBounds oWanted = OutlineOf(oGrid.geocoding, oGrid.width, oGrid.height);
+    if (oWanted.west >= oImage.east || oWanted.east <= oImage.west || oWanted.south >= oImage.north ||
+        oWanted.north <= oImage.south)
+        detail::Target::Warn(oFile.GetName() + ": the grid lies outside of the image; no pixel has a source");
+}
+
 void CheckRequest(const WarpRequest& oRequest)
 {
     const auto IsStep = [](double n)
@@ -195,6 +204,7 @@ WarpResult Warp(const WarpRequest& oRequest, const TargetForm& oForm, const Prog
     const Placement oPlacement = Place(oFile);
     const Grid oGrid =
         oRequest.like.empty() ? MakeGrid(oRequest, oFile, oPlacement.geocoding) : GridLike(oFile, oRequest.like);
+    WarnOfMiss(oFile, oPlacement.geocoding, oGrid);
     WarpResult oResult{oGrid.width, oGrid.height, oGrid.geocoding};
     const std::unique_ptr<krv::gobs::PCT> poTable =
         oChannels.size() == 1 ? FindPCT(oFile.GetDataset(), oChannels.front()) : nullptr;

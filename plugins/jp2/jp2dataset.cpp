@@ -373,4 +373,12 @@ void Jp2Dataset::DeletePCT(unsigned int nPCT)
     mpoWriter->SetPalette(std::nullopt, oPlace);
 }
 
+std::string Jp2Dataset::GetVariant()
+{
+    if (!mpoStream)
+        return {};
+    const std::string kind = moBoxes.empty() ? "codestream" : "JP2";
+    return kind + (mpoStream->GetCoding(0).mbReversible ? ", reversible" : ", not reversible");
+}
+
 } // namespace krv::plugins::jp2

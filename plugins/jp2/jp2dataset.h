@@ -1,6 +1,7 @@
 #pragma once
 
 #include "datasources/interfaces/igeocodeddataset.h"
+#include "datasources/interfaces/ilayoutdataset.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "plugins/jp2/geo/geoboxes.h"
@@ -28,6 +29,7 @@ namespace krv::plugins::jp2
 class Jp2Dataset : public support::Dataset,
                    public krv::datasources::IGeocodedDataset,
                    public krv::datasources::IPCTDataset,
+                   public krv::datasources::ILayoutDataset,
                    public support::FacetsBeside,
                    private support::LevelStore
 {
@@ -62,6 +64,9 @@ public:
     void UpdatePCT(unsigned int nPCT, const krv::gobs::PCT& oTable) override;
     void SetPCTDescription(unsigned int nPCT, const std::string& oDescription) override;
     void DeletePCT(unsigned int nPCT) override;
+
+    std::string GetVariant() override;
+    std::optional<std::vector<std::string>> CheckCloudLayout() override { return std::nullopt; }
 
 protected:
     support::Sidecars::Needs GetNeeds() const override;

@@ -342,6 +342,15 @@ std::optional<std::uint64_t> KrvdskDataset::GetUnusedBytes()
     return mpoStore->GetEnd() - std::min(nUsed, mpoStore->GetEnd());
 }
 
+std::string KrvdskDataset::GetVariant()
+{
+    if (!mpoStore)
+        return {};
+    const Root& oRoot = mpoStore->GetRoot();
+    return "version " + std::to_string(oRoot.mnVersion) + "." + std::to_string(oRoot.mnRevision) +
+           (IsLinked() ? ", linked" : "");
+}
+
 void KrvdskDataset::ForEachPiece(const std::function<void(const Entry& oEntry, const std::string& what)>& oAction,
                                  const TileTable::Complain& oComplain)
 {

@@ -6,6 +6,7 @@
 #include "datasources/interfaces/iencodedblocks.h"
 #include "datasources/interfaces/iephemerisdataset.h"
 #include "datasources/interfaces/ihistoryio.h"
+#include "datasources/interfaces/ilayoutdataset.h"
 #include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/ilutdataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
@@ -42,6 +43,7 @@ class KrvdskDataset : public support::RecordDataset,
                       public krv::datasources::IEphemerisRecords,
                       public krv::datasources::ILinkedDataset,
                       public krv::datasources::IStorageDataset,
+                      public krv::datasources::ILayoutDataset,
                       public krv::datasources::IVerifiedDataset,
                       public krv::datasources::IEncodedBlocks,
                       public krv::datasources::IBlockEncoding,
@@ -117,6 +119,8 @@ public:
     krv::datasources::EphemerisRecords ReadEphemeris(unsigned int nSegment) const override;
 
     std::optional<std::uint64_t> GetUnusedBytes() override;
+    std::string GetVariant() override;
+    std::optional<std::vector<std::string>> CheckCloudLayout() override { return std::nullopt; }
     std::vector<std::string> Verify(const Progress& oProgress) override;
 
     // Of files whose channels are stored in one way: of one type, all together or each by itself, none of them deleted

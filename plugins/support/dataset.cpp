@@ -156,7 +156,9 @@ void Dataset::CheckLacking(bool bLacking, const char* pWhat, const Place& oPlace
 {
     CheckWritingBeside(pWhat, oPlace);
     if (!bLacking)
-        Refuse(std::string(pWhat) + ": the file itself says it, and its format cannot change it", oPlace);
+        Refuse(std::string(pWhat) +
+                   ": the file itself says it, and its format cannot change it; a copy in another format can",
+               oPlace);
 }
 
 // What the record has and the sidecar has not is the file's own.

@@ -189,6 +189,7 @@ TEST_F(EditCommand, ClientsOfCloudFilesFindWhatTheyArePromised)
         const std::size_t nText = bytes[2] == 43 ? 16 : 8;
         EXPECT_EQ(bytes.compare(nText, 43, "GDAL_STRUCTURAL_METADATA_SIZE=000140 bytes\n"), 0);
         EXPECT_EQ(bytes.substr(nText + 43 + 140 - 32, 32), "\nKNOWN_INCOMPATIBLE_EDITION=NO\n ");
+        EXPECT_LT(InfoOf(file)["unusedBytes"], 64) << "of leaders and trailers";
         TIFF* const pTiff = TIFFOpen(file.c_str(), "r");
         ASSERT_NE(pTiff, nullptr);
         std::size_t nBlocks = 0;
@@ -212,6 +213,44 @@ TEST_F(EditCommand, ClientsOfCloudFilesFindWhatTheyArePromised)
         EXPECT_EQ(RunKrv({"checksum", file}).output, oSums);
         std::filesystem::remove(file);
     }
+}
+
+// A client takes the mask of a block from what stands right behind it.
+TEST_F(EditCommand, MasksOfCloudFilesStandBehindTheirBlocks)
+{
+    const std::string masked = Copy("masked.tif", "COMPRESS=DEFLATE"), file = moFolder.File("cog.tif");
+    ASSERT_EQ(RunKrv({"mask", masked, "--polygon", "POLYGON((0 0,600 0,600 600,100 600,0 0))", "--coordinates", "pixel",
+                      "--validity"})
+                  .code,
+              0);
+    ASSERT_EQ(
+        RunKrv({"convert", masked, file, "--options", "LAYOUT=COG COMPRESS=DEFLATE BLOCKXSIZE=512 BLOCKYSIZE=512"})
+            .errors,
+        "");
+    EXPECT_NE(ReadFile(file).find("\n MASK_INTERLEAVED_WITH_IMAGERY=YES\n"), std::string::npos);
+    EXPECT_EQ(InfoOf(file)["cloudLayout"]["valid"], true);
+    EXPECT_EQ(RunKrv({"stats", file}).output, RunKrv({"stats", masked}).output);
+    TIFF* const pTiff = TIFFOpen(file.c_str(), "r");
+    ASSERT_NE(pTiff, nullptr);
+    std::vector<std::uint64_t> oEnds;
+    do
+    {
+        std::uint32_t nKind = 0;
+        TIFFGetField(pTiff, TIFFTAG_SUBFILETYPE, &nKind);
+        const bool bMask = (nKind & FILETYPE_MASK) != 0;
+        for (std::uint32_t nTile = 0; nTile < TIFFNumberOfTiles(pTiff); ++nTile)
+        {
+            const std::uint64_t nAt = TIFFGetStrileOffset(pTiff, nTile);
+            if (bMask)
+                EXPECT_EQ(nAt, oEnds[nTile] + 8) << "a trailer and a leader apart";
+            else
+                oEnds.resize(nTile + 1), oEnds[nTile] = nAt + TIFFGetStrileByteCount(pTiff, nTile);
+        }
+    } while (TIFFReadDirectory(pTiff) == 1);
+    TIFFClose(pTiff);
+    EXPECT_FALSE(oEnds.empty());
+    EXPECT_EQ(RunKrv({"edit", file, "--tag", "A=1"}).code, 0);
+    EXPECT_EQ(RunKrv({"stats", file}).output, RunKrv({"stats", masked}).output);
 }
 
 } // namespace

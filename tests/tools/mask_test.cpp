@@ -227,7 +227,7 @@ TEST_F(MaskCommand, FailuresSayWhyOnOneLineAndChangeNothing)
     const std::vector<krv::test::Refusal> oRefusals{
         {{moFile}, 2, "--polygon, --bitmap or --no-data"},
         {{moFile, "--bitmap", "1", "--no-data"}, 2, "one of them"},
-        {{moFile, "--bitmap", "7", "--write", "new"}, 2, "there is no bitmap 7; there are none"},
+        {{moFile, "--bitmap", "7", "--write", "new"}, 2, "there is no bitmap 7; the file has none"},
         {{moFile, "--no-data", "--write", "4"}, 2, "there is no bitmap 4"},
         {{moFile, "--no-data", "--write", "-1"}, 2, "--write"},
         {{moFile, "--no-data", "--zone"}, 2, "--zone goes with --write"},

@@ -12,6 +12,7 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <cstring>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -27,17 +28,18 @@ constexpr int INTERRUPTED = 130;
 
 constexpr char FOOTER[] =
     "Examples:\n"
-    "  krv info scene.tif                     everything known of a file\n"
-    "  krv stats scene.tif --json             statistics per channel, for other programs\n"
-    "  krv view scene.tif look.png --size 800 a quick look\n"
-    "  krv view \"loop.gif[page=3]\" look.png  a page of an animation\n"
+    "  krv info scene.tif                                everything known of a file\n"
+    "  krv stats scene.tif --json                        statistics per channel, for other programs\n"
+    "  krv view scene.tif look.png --size 800            a quick look\n"
+    "  krv view \"loop.gif[page=3]\" look.png            a page of an animation\n"
     "  krv convert scene.tif copy.tif --options COMPRESS=ZSTD\n"
-    "  krv overviews scene.tif                overview levels, powers of two\n"
+    "  krv overviews scene.tif                           overview levels, powers of two\n"
     "  krv edit scene.tif --no-data 0 --crs EPSG:32633   what the file says, in place\n"
-    "  krv sample scene.tif 500020 5199990    values at points\n"
-    "  krv doctor scene.tif                   why a file does or does not open\n"
-    "`krv VERB --help` explains a verb. Exit code: 0 done; 2 the command line is wrong, by itself or\n"
-    "for this file; 1 it failed: a file, the disk, memory; 130 interrupted.\n"
+    "  krv sample scene.tif 500020 5199990               values at points\n"
+    "  krv doctor scene.tif                              why a file does or does not open\n"
+    "`krv VERB --help` explains a verb.\n"
+    "Exit code: 0 done; 1 failed (a file, the disk, memory); 2 the command line is wrong, by itself or\n"
+    "for this file; 130 interrupted.\n"
     "Formats are found below the folder that KRVHOME names, else beside the library.";
 
 constexpr unsigned int MOST_THREADS = 1024;
@@ -116,7 +118,7 @@ bool RefuseVerb(const CLI::App& oApp, const std::string& verb)
     for (const std::string& name : oVerbs)
         all += (all.empty() ? "" : ", ") + name;
     std::fprintf(stderr, "krv: there is no verb \"%s\"; %s\n", OneLine(verb).c_str(),
-                 (nearest.empty() ? "there are " + all : "is " + nearest + " meant?").c_str());
+                 (nearest.empty() ? "the verbs are " + all : "is " + nearest + " meant?").c_str());
     return true;
 }
 
@@ -127,9 +129,12 @@ std::string DescribeMistake(const CLI::App* poApp, const CLI::Error& oError)
     const auto oUsed = poApp->get_subcommands();
     const CLI::App& oVerb = oUsed.empty() ? *poApp : *oUsed.front();
     const std::size_t nTwice = text.find(": At Most 1 required but received");
+    const std::size_t nFew = text.find(": At least ");
     const std::size_t nUnknown = text.rfind(" --");
     if (nTwice != std::string::npos)
         text.replace(nTwice, std::string::npos, " is given more than once");
+    else if (nFew != std::string::npos)
+        text = "too few " + text.substr(0, nFew) + ": at least " + text.substr(nFew + std::strlen(": At least "));
     else if (dynamic_cast<const CLI::ExtrasError*>(&oError) != nullptr && nUnknown != std::string::npos)
     {
         std::vector<std::string> oNames;
@@ -177,13 +182,13 @@ int RunApplication(int nArguments, char** pArguments)
 {
     CLI::App oApp("Reads and writes raster files of every format that has a plug-in.", "krv");
     oApp.formatter(std::make_shared<HelpFormatter>());
-    oApp.set_help_flag("-h,--help", "Say this");
+    oApp.set_help_flag("-h,--help", "Show this help");
     Selection oSelection;
     bool bVerbose = false;
     unsigned int nThreads = 0;
-    oApp.set_version_flag("--version", "krv " KRV_VERSION, "Say which version this is");
+    oApp.set_version_flag("--version", "krv " KRV_VERSION, "Show the version");
     oApp.add_flag("--verbose", bVerbose, "Errors also name the function, source file and line");
-    oApp.add_option("--threads", nThreads, "How many threads work at one time; one for each processor by default")
+    oApp.add_option("--threads", nThreads, "How many threads work at a time; by default one for each processor")
         ->check(CLI::Range(1U, MOST_THREADS));
     oApp.failure_message(&DescribeMistake);
     oApp.require_subcommand(1);
@@ -203,6 +208,9 @@ int RunApplication(int nArguments, char** pArguments)
     AddSampleVerb(oApp, oSelection);
     AddDoctorVerb(oApp, oSelection);
     AddDescribeVerb(oApp, oSelection);
+    for (CLI::App* const poVerb :
+         oApp.get_subcommands([](const CLI::App* poOne) { return !poOne->get_group().empty(); }))
+        poVerb->group("Verbs");
     RefuseEmptyValues(oApp);
     oApp.footer(FOOTER); // after the verbs, which would take it over
     if (RefuseVerb(oApp, FindVerb(nArguments, pArguments)))

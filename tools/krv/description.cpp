@@ -266,7 +266,8 @@ std::string MakeManPage(const CLI::App& oApp, const std::string& verb, const std
             return Heading("krv-" + verb, poVerb->get_description(), version) +
                    fmt::format(".SH SYNOPSIS\n\\fBkrv {}\\fR [\\fIOPTIONS\\fR]\\fI{}\\fR\n", verb,
                                Roff(PlacesText(*poVerb))) +
-                   OptionsText(*poVerb) + FooterText(*poVerb) + ".SH SEE ALSO\n\\fBkrv\\fR(1)\n";
+                   OptionsText(*poVerb) + FooterText(*poVerb) +
+                   ".SH SEE ALSO\n\\fBkrv\\fR(1), for \\-\\-threads and \\-\\-verbose too, and exit codes\n";
     throw UsageError("\"" + verb + "\" is no verb of krv");
 }
 

@@ -46,7 +46,6 @@ HelpFormatter::HelpFormatter()
 {
     column_width(LEFT);
     label("SUBCOMMAND", "VERB");
-    label("Subcommands", "Verbs");
     label("Positionals", "Arguments");
 }
 
@@ -65,6 +64,14 @@ std::string HelpFormatter::make_option_desc(const CLI::Option* poOption) const
     for (const std::string& word : GetWordsOf(*poOption))
         words += (words.empty() ? " One of " : ", ") + word;
     return Wrap(poOption->get_description() + (words.empty() ? "" : "." + words));
+}
+
+std::string HelpFormatter::make_footer(const CLI::App* poApp) const
+{
+    const std::string every = poApp->get_parent() != nullptr
+                                  ? "\nEvery verb takes --threads and --verbose too: `krv --help` explains them.\n"
+                                  : "";
+    return Formatter::make_footer(poApp) + every;
 }
 
 std::string HelpFormatter::make_subcommand(const CLI::App* poVerb) const

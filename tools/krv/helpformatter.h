@@ -19,6 +19,7 @@ public:
 
     std::string make_option_opts(const CLI::Option* poOption) const override;
     std::string make_option_desc(const CLI::Option* poOption) const override;
+    std::string make_footer(const CLI::App* poApp) const override;
     std::string make_subcommand(const CLI::App* poVerb) const override;
 };
 

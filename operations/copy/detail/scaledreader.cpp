@@ -54,7 +54,7 @@ ValueScale LineOf(const std::vector<double>& oScale, const Limits& oTo)
 {
     const double nScale = (oTo.high - oTo.low) / (oScale[1] - oScale[0]);
     if (!std::isfinite(nScale) || nScale == 0)
-        throw RequestException("a scale leads from two different numbers to two different ones");
+        throw RequestException("--scale: the two numbers of each pair are to differ");
     return {nScale, oTo.low - oScale[0] * nScale};
 }
 

@@ -187,7 +187,7 @@ void CheckTarget(const std::vector<std::string>& oSources, const std::string& ta
             throw RequestException(target + " is the file itself; name another for the copy");
     }
     if (std::filesystem::exists(target, oNone) && !std::filesystem::is_regular_file(target, oNone))
-        throw krv::DataException(target + " is there and no plain file; name another for the copy");
+        throw RequestException(target + " is there and no plain file; name another for the copy");
 }
 
 void StoreReaders(const SourceFile& oFile, const std::vector<StoredChannels>& oStored, const PixelWindow& oWindow,

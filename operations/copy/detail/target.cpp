@@ -141,10 +141,11 @@ void Target::MakeByUser(const TargetForm& oForm, const std::string& options)
     catch (const krv::DataException& oError)
     {
         if (bMixed)
-            throw krv::DataException(oError.GetMessage() + " (--type gives all channels one type)");
+            throw RequestException(oError.GetMessage() + " (--type gives all channels one type)");
         if (oForm.options.empty())
             throw;
-        throw RequestException("--options: " + oError.GetMessage());
+        throw RequestException(
+            fmt::format("--options: {} (`krv formats {}` lists all)", oError.GetMessage(), moFormat));
     }
 }
 

@@ -19,7 +19,7 @@ void CheckName(const std::string& fileName, bool bReplace, const Place& oPlace)
 {
     struct stat oStatus = {};
     if (fileName.empty() || fileName.back() == '/')
-        throw IOException(fileName, "\"" + fileName + "\": a new file has a name", oPlace);
+        throw IOException(fileName, "\"" + fileName + "\": it names a folder; give a new file a name in it", oPlace);
     if (::stat(fileName.c_str(), &oStatus) == 0 && !S_ISREG(oStatus.st_mode))
         throw IOException(fileName, fileName + ": is not a plain file and is not replaced", oPlace);
     if (!bReplace && ::lstat(fileName.c_str(), &oStatus) == 0)

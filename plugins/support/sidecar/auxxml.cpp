@@ -1,5 +1,6 @@
 #include "plugins/support/sidecar/auxxml.h"
 
+#include "datasources/metadata/classnames.h"
 #include "datasources/metadata/droppedtags.h"
 #include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -28,6 +29,9 @@ constexpr char ROOT[] = "PAMDataset";
 constexpr char BAND[] = "PAMRasterBand";
 constexpr char HISTOGRAMS[] = "Histograms";
 constexpr char METADATA[] = "Metadata";
+constexpr char CATEGORIES[] = "CategoryNames";
+constexpr char CATEGORY[] = "Category";
+constexpr unsigned int MOST_CATEGORIES = 65536;
 constexpr char STAMP[] = "WrittenBeside";
 constexpr char DESCRIPTION[] = "Description";
 constexpr char BLANKS[] = " \t\r\n";
@@ -117,6 +121,25 @@ void AppendMetadata(const MetadataMap& oMap, Element& oParent)
     }
 }
 
+// Takes the names of classes out of a map: a list of them all from value 0, with empty ones between.
+void MoveCategories(MetadataMap& oMap, Element& oBand)
+{
+    std::map<unsigned int, std::string> oNames;
+    for (const auto& [key, name] : oMap)
+        if (const auto oValue = krv::datasources::ParseClassNameKey(key); oValue && *oValue < MOST_CATEGORIES)
+            oNames[*oValue] = name;
+    if (oNames.empty())
+        return;
+    Element oList = MakeElement(CATEGORIES, "");
+    oList.children.resize(oNames.rbegin()->first + 1, MakeElement(CATEGORY, ""));
+    for (const auto& [nValue, name] : oNames)
+    {
+        oList.children[nValue].text = krv::xml::MakeXmlText(name);
+        oMap.erase(krv::datasources::MakeClassNameKey(nValue));
+    }
+    oBand.children.push_back(std::move(oList));
+}
+
 bool IsForeign(const std::string& domain)
 {
     return std::any_of(std::begin(FOREIGN_DOMAINS), std::end(FOREIGN_DOMAINS),
@@ -189,6 +212,8 @@ void AuxXml::ReadBand(const Element& oBand)
             moTags.SetChannelDescription(oChild.text, nChannel);
         else if (oChild.name == METADATA && !IsForeign(GetAttribute(oChild, "domain")))
             ReadMetadata(oChild, nChannel);
+        else if (oChild.name == CATEGORIES)
+            ReadCategories(oChild, nChannel);
         else
             oRest.children.push_back(oChild);
     }
@@ -201,6 +226,19 @@ void AuxXml::SetTags(const krv::datasources::AuxiliaryData& oTags)
     krv::datasources::AuxiliaryData oNew = oTags;
     krv::datasources::DropRemoved(oNew, moTags);
     moTags = std::move(oNew);
+}
+
+void AuxXml::ReadCategories(const Element& oList, unsigned int nChannel)
+{
+    unsigned int nValue = 0;
+    for (const Element& oItem : oList.children)
+    {
+        if (oItem.name != CATEGORY || nValue >= MOST_CATEGORIES)
+            continue;
+        if (const std::string name = Trim(oItem.text); !name.empty())
+            moTags.SetChanMetadataValue(krv::datasources::MakeClassNameKey(nValue), name, nChannel);
+        ++nValue;
+    }
 }
 
 bool AuxXml::DropStatistics()
@@ -253,6 +291,7 @@ std::string AuxXml::Write() const
                 oBand.children.push_back(MakeElement(pElement, oValue->second));
                 oMap.erase(oValue);
             }
+        MoveCategories(oMap, oBand);
         AppendMetadata(oMap, oBand);
         if (oFound == oRoot.children.end())
             oRoot.children.push_back(std::move(oNew));

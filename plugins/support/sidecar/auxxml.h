@@ -12,7 +12,8 @@ namespace krv::plugins::support
 {
 
 // The file "<image>.aux.xml": a root PAMDataset with the reference system, the transform, tags of the file and of each
-// band, no-data values, descriptions, units, scales. Tags have the domain of theirs before a colon, when it has one.
+// band, no-data values, descriptions, units, scales, names of classes. Tags have the domain of theirs before a colon,
+// when it has one.
 class AuxXml
 {
 public:
@@ -52,6 +53,7 @@ public:
 private:
     void ReadMetadata(const krv::xml::Element& oElement, unsigned int nChannel);
     void ReadBand(const krv::xml::Element& oBand);
+    void ReadCategories(const krv::xml::Element& oList, unsigned int nChannel);
 
     krv::xml::Element moRoot; // what is not known
     std::string moCRS;

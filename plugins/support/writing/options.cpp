@@ -24,22 +24,30 @@ void Options::Parse(const std::string& options, const Place& oPlace)
     for (std::string word; oWords >> word;)
     {
         const std::size_t nSign = word.find('=');
-        if (nSign == std::string::npos)
+        if (nSign == std::string::npos || nSign == 0)
             throw DataException("The option \"" + word + "\" is not of the form KEY=VALUE", oPlace);
         const std::string key = ToUpper(word.substr(0, nSign));
         const std::string value = word.substr(nSign + 1);
         const auto oKey = std::find_if(moKeys.begin(), moKeys.end(),
                                        [&key](const Key& oOne) { return oOne.moDescription.moKey == key; });
         if (oKey == moKeys.end())
-            throw DataException("The option " + key + " is not known", oPlace);
+            throw DataException("The option " + key + " is not known; there are " + ListKeys(), oPlace);
         if (!oKey->moTake(value))
-            throw DataException("The option " + key + "=" + ToUpper(value) + " is not known; it takes " +
+            throw DataException("The option " + key + " does not take \"" + value + "\"; it takes " +
                                     oKey->moDescription.moTakes,
                                 oPlace);
         if (oKey->mbGiven)
             throw DataException("The option " + key + " is given twice", oPlace);
         oKey->mbGiven = true;
     }
+}
+
+std::string Options::ListKeys() const
+{
+    std::string all;
+    for (const Key& oKey : moKeys)
+        all += (all.empty() ? "" : ", ") + oKey.moDescription.moKey;
+    return all;
 }
 
 bool Options::IsGiven(const std::string& key) const

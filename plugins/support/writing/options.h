@@ -82,6 +82,8 @@ private:
         bool mbGiven = false;
     };
 
+    std::string ListKeys() const;
+
     std::vector<Key> moKeys;
 };
 

@@ -17,6 +17,7 @@ constexpr std::size_t FIRST_LINE_BYTES = FIRST_LINE.size() + SIZE_DIGITS + FIRST
 constexpr std::string_view ROW_MAJOR = "BLOCK_ORDER=ROW_MAJOR\n";
 constexpr std::string_view LEADERS = "BLOCK_LEADER=SIZE_AS_UINT4\n";
 constexpr std::string_view TRAILERS = "BLOCK_TRAILER=LAST_4_BYTES_REPEATED\n";
+constexpr std::string_view MASKED = "MASK_INTERLEAVED_WITH_IMAGERY=YES\n";
 // One byte shorter than the other, so that a blank follows it.
 constexpr std::string_view UNCHANGED = "KNOWN_INCOMPATIBLE_EDITION=NO\n ";
 constexpr std::string_view CHANGED = "KNOWN_INCOMPATIBLE_EDITION=YES\n";
@@ -45,7 +46,7 @@ std::optional<CloudHeader> CloudHeader::Read(const support::File& oFile, const F
     return CloudHeader{line + lines, Says(ROW_MAJOR), Says(LEADERS), Says(TRAILERS), Says(CHANGED)};
 }
 
-std::string CloudHeader::Make(bool bRowMajor)
+std::string CloudHeader::Make(bool bRowMajor, bool bMasked)
 {
     std::string lines = "LAYOUT=IFDS_BEFORE_DATA\n";
     if (bRowMajor)
@@ -53,6 +54,8 @@ std::string CloudHeader::Make(bool bRowMajor)
     lines += LEADERS;
     lines += TRAILERS;
     lines += UNCHANGED;
+    if (bMasked)
+        lines += MASKED;
     std::string digits = std::to_string(lines.size());
     digits.insert(0, SIZE_DIGITS - digits.size(), '0');
     return std::string(FIRST_LINE) + digits + std::string(FIRST_LINE_END) + lines;

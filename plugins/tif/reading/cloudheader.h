@@ -28,8 +28,8 @@ struct CloudHeader
 
     // None for a file without one, or with one that is damaged.
     static std::optional<CloudHeader> Read(const support::File& oFile, const FileHeader& oHeader);
-    // Of a new file, with leaders and trailers.
-    static std::string Make(bool bRowMajor);
+    // Of a new file, with leaders and trailers. bMasked: behind each block stands that of its mask.
+    static std::string Make(bool bRowMajor, bool bMasked);
     // The same text, saying that the file was changed; the text itself where it has no room for that.
     static std::string MarkChanged(const std::string& text);
 };

@@ -6,6 +6,7 @@
 #include "plugins/tif/writing/pagewriter.h"
 
 #include <algorithm>
+#include <span>
 #include <utility>
 
 #include <tiff.h>
@@ -58,6 +59,38 @@ void Sort(std::vector<Placed>& oSorted)
                      { return GetPixels(oFirst.moPage) > GetPixels(oSecond.moPage); });
 }
 
+bool IsStored(const PageModel& oPage, std::size_t nBlock)
+{
+    return oPage.moByteCounts[nBlock] != 0;
+}
+
+// Whether a page is the mask of an image, in blocks of the same places, and no block of the image is without one.
+bool IsMaskOf(const PageModel& oMask, const PageModel& oImage)
+{
+    const auto IsMask = [](const PageModel& oPage)
+    {
+        return (oPage.moTags.GetNumber(TIFFTAG_SUBFILETYPE, 0) & FILETYPE_MASK) != 0;
+    };
+    if (!IsMask(oMask) || IsMask(oImage) || oMask.GetStriles() != oImage.GetStriles())
+        return false;
+    for (const std::uint16_t nTag : {TIFFTAG_IMAGEWIDTH, TIFFTAG_IMAGELENGTH, TIFFTAG_TILEWIDTH, TIFFTAG_TILELENGTH})
+        if (oMask.moTags.GetNumber(nTag, 0) != oImage.moTags.GetNumber(nTag, 0))
+            return false;
+    for (std::size_t nAt = 0; nAt < oImage.GetStriles(); ++nAt)
+        if (IsStored(oImage, nAt) && !IsStored(oMask, nAt))
+            return false;
+    return true;
+}
+
+// Whether the image and each level is followed by its mask.
+bool AreInPairs(const std::vector<Placed>& oSorted)
+{
+    for (std::size_t nAt = 0; nAt < oSorted.size(); nAt += 2)
+        if (nAt + 1 == oSorted.size() || !IsMaskOf(oSorted[nAt + 1].moPage, oSorted[nAt].moPage))
+            return false;
+    return true;
+}
+
 void PlaceDirectory(Placed& oPlaced, const FileHeader& oHeader, std::uint64_t nBehind, support::Space& oSpace)
 {
     const std::size_t nWord = oHeader.mbBigTiff ? 8 : 4;
@@ -86,20 +119,37 @@ void Enclose(const support::CopiedPiece& oBlock, support::File& oTarget)
     oTarget.Write(nEnd, aTrailer, sizeof(aTrailer));
 }
 
-void CopyBlocks(Placed& oPlaced, const support::File& oSource, support::Space& oSpace, support::File& oTarget,
-                bool bEnclosed, support::Scratch& oScratch)
+// A block that masks go with: its room in the file holds theirs, which follow it without a gap.
+void PlaceBlocks(std::span<Placed> oPages, std::size_t nAt, bool bEnclosed, support::Space& oSpace,
+                 std::vector<support::CopiedPiece>& oPieces)
 {
     const std::uint64_t nBefore = bEnclosed ? CloudHeader::LEADER_BYTES : 0;
     const std::uint64_t nAround = bEnclosed ? nBefore + CloudHeader::TRAILER_BYTES : 0;
-    PageModel& oPage = oPlaced.moPage;
-    std::vector<support::CopiedPiece> oPieces;
-    for (std::size_t nAt = 0; nAt < oPage.GetStriles(); ++nAt)
+    std::uint64_t nRoom = 0;
+    for (const Placed& oPlaced : oPages)
+        nRoom += IsStored(oPlaced.moPage, nAt) ? oPlaced.moPage.moByteCounts[nAt] + nAround : 0;
+    std::uint64_t nNext = nRoom == 0 ? 0 : oSpace.Allocate(nRoom).mnOffset;
+    for (Placed& oPlaced : oPages)
     {
-        const std::uint64_t nBytes = oPage.moByteCounts[nAt];
-        oPage.moOffsets[nAt] = nBytes == 0 ? 0 : oSpace.Allocate(nBytes + nAround).mnOffset + nBefore;
-        if (nBytes != 0)
-            oPieces.push_back({oPlaced.mpOld->moOffsets[nAt], oPage.moOffsets[nAt], nBytes});
-        if (oPieces.size() < COPIED_PIECES && nAt + 1 < oPage.GetStriles())
+        const std::uint64_t nBytes = oPlaced.moPage.moByteCounts[nAt];
+        oPlaced.moPage.moOffsets[nAt] = nBytes == 0 ? 0 : nNext + nBefore;
+        if (nBytes == 0)
+            continue;
+        oPieces.push_back({oPlaced.mpOld->moOffsets[nAt], nNext + nBefore, nBytes});
+        nNext += nBytes + nAround;
+    }
+}
+
+// oPages: an image, or an image and its mask.
+void CopyBlocks(std::span<Placed> oPages, const support::File& oSource, support::Space& oSpace, support::File& oTarget,
+                bool bEnclosed, support::Scratch& oScratch)
+{
+    const std::size_t nBlocks = oPages.front().moPage.GetStriles();
+    std::vector<support::CopiedPiece> oPieces;
+    for (std::size_t nAt = 0; nAt < nBlocks; ++nAt)
+    {
+        PlaceBlocks(oPages, nAt, bEnclosed, oSpace, oPieces);
+        if (oPieces.size() < COPIED_PIECES && nAt + 1 < nBlocks)
             continue;
         support::CopyPieces(oSource, oTarget, oPieces, oScratch);
         for (const support::CopiedPiece& oPiece : oPieces)
@@ -127,9 +177,9 @@ void WriteDirectory(const Placed& oPlaced, const FileHeader& oHeader, std::uint6
 
 // Writes a file anew so that it can be read in few requests over a network: the header, all directories with their
 // values, the image first and its levels from large to small, and then the blocks, those of the smallest level first
-// and in each page in their order. Blocks are copied as they are stored. bCloud: with the text that tells clients so;
-// otherwise pages stay in their order.
-// oPages: of the chain, their tags in memory; the first is the image.
+// and in each page in their order, each with that of its mask where every image has one and the same blocks. Blocks are
+// copied as they are stored. bCloud: with the text that tells clients so; otherwise pages stay in their order. oPages:
+// of the chain, their tags in memory; the first is the image.
 void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, const FileHeader& oHeader,
                       const support::File& oSource, support::File& oTarget, bool bCloud)
 {
@@ -141,15 +191,16 @@ void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, con
     const bool bRowMajor =
         std::all_of(oPages.begin(), oPages.end(),
                     [](const auto& poPage) { return poPage->moTags.GetNumber(TIFFTAG_PLANARCONFIG, 1) == 1; });
-    const std::string text = bEnclosed ? CloudHeader::Make(bRowMajor) : std::string();
+    const std::size_t nTogether = bEnclosed && AreInPairs(oSorted) ? 2 : 1;
+    const std::string text = bEnclosed ? CloudHeader::Make(bRowMajor, nTogether == 2) : std::string();
     support::Space oSpace(oTarget.GetName(), oHeader.GetBytes() + text.size(),
                           oHeader.mbBigTiff ? INT64_MAX : UINT32_MAX,
                           "the file would pass the limit of 4 GiB of classic TIFF");
     for (Placed& oPlaced : oSorted)
         PlaceDirectory(oPlaced, oHeader, &oPlaced == oSorted.data() ? support::RoomRecord::GetBytes(0) : 0, oSpace);
     support::Scratch oScratch;
-    for (auto oPlaced = oSorted.rbegin(); oPlaced != oSorted.rend(); ++oPlaced)
-        CopyBlocks(*oPlaced, oSource, oSpace, oTarget, bEnclosed, oScratch);
+    for (std::size_t nEnd = oSorted.size(); nEnd != 0; nEnd -= nTogether)
+        CopyBlocks({&oSorted[nEnd - nTogether], nTogether}, oSource, oSpace, oTarget, bEnclosed, oScratch);
     for (std::size_t nAt = 0; nAt < oSorted.size(); ++nAt)
         WriteDirectory(oSorted[nAt], oHeader,
                        nAt + 1 < oSorted.size() ? oSorted[nAt + 1].moPage.moDirectory.mnOffset : 0, oTarget);

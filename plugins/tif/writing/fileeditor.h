@@ -149,6 +149,8 @@ private:
     std::uint64_t mnNextNumber = 1;
     std::uint64_t mnModelBytes = UINT64_MAX; // that the structure may still take
     std::uint64_t mnCloudBytes = 0;          // of the text for clients behind the header
+    std::uint64_t mnBeforeBlock = 0;         // of the leader of each block
+    std::uint64_t mnBehindBlock = 0;         // of its trailer
     bool mbMarked = false;                   // it says that the file was changed
     std::uint64_t mnCommittedSize = 0;       // of the file with all that its committed state may use
     std::vector<Extent> moReleased;          // of pages that are gone

@@ -56,7 +56,11 @@ FileEditor::FileEditor(std::shared_ptr<support::File> poFile, const std::optiona
     mpoSpace->Age(moHeader.mnFirstDirectory);
     mnCommittedSize = GetFile()->GetSize();
     if (const std::optional<CloudHeader> oCloud = CloudHeader::Read(*GetFile(), moHeader))
+    {
         mnCloudBytes = oCloud->moText.size();
+        mnBeforeBlock = oCloud->mbLeaders && !oCloud->mbChanged ? CloudHeader::LEADER_BYTES : 0;
+        mnBehindBlock = oCloud->mbTrailers && !oCloud->mbChanged ? CloudHeader::TRAILER_BYTES : 0;
+    }
     mnModelBytes = MODEL_BYTES + MODEL_BYTES_PER_BYTE * mnCommittedSize;
     ReadPages();
     FindUnused();
@@ -213,7 +217,13 @@ std::vector<Extent> FileEditor::ListUsed() const
         for (const Tag& oTag : poPage->moTags.GetTags())
             Add(oTag.moStored);
         for (std::size_t nAt = 0; nAt < poPage->GetStriles(); ++nAt)
-            Add({poPage->moOffsets[nAt], std::max(poPage->moRoom[nAt], poPage->moByteCounts[nAt]), 0});
+        {
+            const std::uint64_t nOffset = poPage->moOffsets[nAt];
+            const std::uint64_t nBytes = std::max(poPage->moRoom[nAt], poPage->moByteCounts[nAt]);
+            const std::uint64_t nBefore = std::min(mnBeforeBlock, nOffset);
+            if (nBytes != 0)
+                Add({nOffset - nBefore, nBefore + nBytes + mnBehindBlock, 0});
+        }
     }
     std::sort(oUsed.begin(), oUsed.end(),
               [](const Extent& oFirst, const Extent& oSecond) { return oFirst.mnOffset < oSecond.mnOffset; });

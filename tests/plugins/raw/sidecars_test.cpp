@@ -99,11 +99,16 @@ TEST(AuxXmlFiles, AreMerged)
         "<Metadata><MDI key='a'>1</MDI></Metadata><Metadata domain='D'><MDI key='b'>&lt;2&gt;</MDI></Metadata>"
         "<Metadata domain='ENVI'><MDI key='bands'>7</MDI></Metadata>"
         "<PAMRasterBand band='2'><NoDataValue> -9.99E+03 </NoDataValue><Histograms><HistItem/></Histograms>"
-        "<Description>two</Description><Scale>0.5</Scale></PAMRasterBand>"
+        "<Description>two</Description><Scale>0.5</Scale>"
+        "<CategoryNames><Category>water</Category><Category/><Category> a, b "
+        "</Category></CategoryNames></PAMRasterBand>"
         "<PAMRasterBand band='9'><NoDataValue>1</NoDataValue></PAMRasterBand></PAMDataset>";
     AuxXml oFirst(text, "x", 2);
     EXPECT_EQ(oFirst.GetTags().GetFileMetadata(), (MetadataMap{{"a", "1"}, {"D:b", "<2>"}}));
-    EXPECT_EQ(oFirst.GetTags().GetChanMetadata(2), (MetadataMap{{"NO_DATA_VALUE", "-9.99E+03"}, {"Scale", "0.5"}}));
+    EXPECT_EQ(
+        oFirst.GetTags().GetChanMetadata(2),
+        (MetadataMap{
+            {"NO_DATA_VALUE", "-9.99E+03"}, {"Scale", "0.5"}, {"CLASS_NAME_0", "water"}, {"CLASS_NAME_2", "a, b"}}));
     EXPECT_TRUE(oFirst.GetGeocoding() == krv::ogc::cs::GeocodingInfo(1, 2, 0, 3, 0, -2));
     AuxiliaryData oTags = oFirst.GetTags();
     oTags.SetChanMetadataValue("own:key", "\"&'\n\t", 1);
@@ -113,13 +118,14 @@ TEST(AuxXmlFiles, AreMerged)
     oFirst.SetStamp({80, -1});
     const AuxXml oSecond(oFirst.Write(), "x", 2);
     EXPECT_EQ(oSecond.Write(), oFirst.Write());
+    EXPECT_EQ(oSecond.GetTags().GetChanMetadata(2), oFirst.GetTags().GetChanMetadata(2));
     EXPECT_EQ(oSecond.GetTags().GetChanMetadata(1), (MetadataMap{{"own:key", "\"&'\n\t"}}));
     EXPECT_EQ(oSecond.GetTags().GetChannelDescription(2), "two");
     EXPECT_TRUE(oSecond.GetTags().GetFileMetadata().empty());
     EXPECT_EQ(oSecond.GetCRS(), "EPSG:4326");
     EXPECT_FALSE(oSecond.GetGeocoding());
     EXPECT_TRUE(oSecond.GetStamp() == (AuxXml::Stamp{80, -1}));
-    for (const char* pKept : {"<Unknown>kept</Unknown>", "<HistItem>", "band=\"9\""})
+    for (const char* pKept : {"<Unknown>kept</Unknown>", "<HistItem>", "band=\"9\"", "<Category>a, b"})
         EXPECT_NE(oSecond.Write().find(pKept), std::string::npos) << pKept;
     for (const char* pBad : {"", "<Other/>", "<PAMDataset>", "Test file", "<!DOCTYPE a []><PAMDataset/>"})
         EXPECT_THROW(AuxXml(pBad, "x", 1), krv::DataException) << pBad;

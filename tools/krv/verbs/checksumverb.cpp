@@ -55,7 +55,8 @@ int RunChecksum(Selection& oSelection, const Options& oOptions)
 void AddChecksumVerb(CLI::App& oApp, Selection& oSelection)
 {
     auto* const poVerb = oApp.add_subcommand(
-        "checksum", "CRC-32 of each channel over its decoded pixels: row by row, little-endian, without margins");
+        "checksum",
+        "Computes the CRC-32 of each channel over its decoded pixels: row by row, little-endian, without margins");
     const auto poOptions = std::make_shared<Options>();
     poVerb->add_option("FILES", poOptions->files, "The files")->required();
     poVerb->add_option("--channels", poOptions->channels, "Only these, such as 1,3 or 1-3");

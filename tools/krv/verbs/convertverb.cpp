@@ -44,18 +44,18 @@ constexpr std::pair<const char*, krv::gobs::NativeDataTypeCode> TYPE_NAMES[] = {
 krv::gobs::DataType ParseType(const std::string& given)
 {
     const std::string text = krv::ToUpper(given);
-    std::string all;
+    std::string all = "promoted";
     for (int nCode = krv::gobs::eDT_8U; nCode <= krv::gobs::eDT_C64R; ++nCode)
     {
         const krv::gobs::DataType oType(static_cast<krv::gobs::NativeDataTypeCode>(nCode));
         if (oType.Describe() == text)
             return oType;
-        all += " " + oType.Describe();
+        all += ", " + oType.Describe();
     }
     for (const auto& [pName, eCode] : TYPE_NAMES)
         if (text == pName)
             return krv::gobs::DataType(eCode);
-    throw UsageError("--type: \"" + given + "\" is none of promoted" + all +
+    throw UsageError("--type: \"" + given + "\" is none of " + all +
                      ", nor a name such as uint8, int16, float32 or complex64");
 }
 
@@ -95,13 +95,15 @@ void AddConvertVerb(CLI::App& oApp, Selection& oSelection)
     poVerb->add_flag("--power", poOptions->power, "The power of a radar scene in place of its channels");
     poVerb->add_option("--type", poOptions->type,
                        "Values of this type, such as 16S or int16, or of the smallest that holds all: promoted");
-    auto* const poUnscale = poVerb->add_flag("--unscale", poOptions->unscale,
-                                             "What the values stand for: multiplied by the recorded scale, with the "
-                                             "offset added; as 32R unless --type says");
+    auto* const poUnscale =
+        poVerb->add_flag("--unscale", poOptions->unscale,
+                         "Store what the values stand for: multiplied by the recorded scale, with the "
+                         "offset added; as 32R unless --type says");
     poVerb
-        ->add_option("--scale", poOptions->scale,
-                     "Values from low,high spread over the type (over 0 to 1 for reals), or low,high,to,to; what lies "
-                     "beyond is cut off, and scale and offset are recorded")
+        ->add_option(
+            "--scale", poOptions->scale,
+            "Spread the values from low,high over the type (reals: over 0 to 1), or from low,high to low,high: "
+            "0,4000,0,255. What lies beyond is cut off; scale and offset are recorded")
         ->excludes(poUnscale);
     poVerb->add_option("--no-data", poOptions->noData,
                        "The no-data value, in place of the recorded one; the copy records it");
@@ -112,6 +114,10 @@ void AddConvertVerb(CLI::App& oApp, Selection& oSelection)
                        "TIF also builds levels");
     poVerb->add_flag("--check", poOptions->form.check,
                      "Decode what is copied as it is stored: a damaged file is refused instead of copied");
+    poVerb->footer("Examples:\n"
+                   "  krv convert scene.tif part.tif --channels 4,3,2 --window 0,0,1000,1000\n"
+                   "  krv convert scene.tif cloud.tif --options \"LAYOUT=COG COMPRESS=DEFLATE\"\n"
+                   "  krv convert scene.tif small.tif --type uint8 --scale 0,4000");
     poVerb->callback(
         [&oSelection, poOptions]
         {

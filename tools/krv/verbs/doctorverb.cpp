@@ -70,12 +70,12 @@ int RunDoctor(const std::string& file, bool bCog, bool bJson)
 void AddDoctorVerb(CLI::App& oApp, Selection& oSelection)
 {
     auto* const poVerb = oApp.add_subcommand(
-        "doctor", "Checks the installation and each plug-in; for a FILE also why it does or does not open");
+        "doctor", "Checks the installation and each plug-in, and says why a FILE does or does not open");
     const auto poJson = std::make_shared<bool>(false), poCog = std::make_shared<bool>(false);
     poVerb->add_option("FILE", oSelection.file, "A file that should open");
     poVerb->add_flag("--cog", *poCog, "Whether FILE is laid out for reading over a network (COG), and if not, why");
     poVerb->add_flag("--json", *poJson, "As JSON");
-    poVerb->footer("Exit code 1 when anything is wrong.");
+    poVerb->footer("The exit code is 1 when anything is wrong.");
     poVerb->callback(
         [&oSelection, poCog, poJson]
         {

@@ -185,14 +185,14 @@ void AddEditVerb(CLI::App& oApp, Selection& oSelection)
     poOrigin->needs(poSize)->excludes(poTerms);
     poSize->needs(poOrigin);
     poBounds->excludes(poTerms)->excludes(poOrigin);
-    poVerb->add_option("--tag", poOptions->tags, "A tag as KEY=VALUE; may be repeated")
+    poVerb->add_option("--tag", poOptions->tags, "Set a tag: KEY=VALUE; may be repeated")
         ->expected(1)
         ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
-    poVerb->add_option("--remove-tag", poOptions->removedTags, "The name of a tag to remove; may be repeated")
+    poVerb->add_option("--remove-tag", poOptions->removedTags, "Remove the tag of this name; may be repeated")
         ->expected(1)
         ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
     poVerb->add_option("--channels", poOptions->channels,
-                       "Tags and the no-data value are of these channels, such as 1,3, not of the whole file");
+                       "Tags and the no-data value are of these channels, such as 1,3 or 1-3, not of the whole file");
     poVerb
         ->add_option("--description", poOptions->descriptions,
                      "What a channel is, such as 4=\"near infrared\"; 4=none removes it; may be repeated")
@@ -207,14 +207,14 @@ void AddEditVerb(CLI::App& oApp, Selection& oSelection)
     poVerb->add_option("--display", poOptions->display,
                        "The channels shown by default: 4,3,2 as red, green and blue, or 1 as grey; none removes them");
     poVerb->add_option("--like", poOptions->request.like,
-                       "Copy from this file what it says; values given beside it win over that");
+                       "Copy what this file says; options given beside it win over that");
     poVerb
         ->add_option("--copy", poOptions->copy,
-                     "What of it, such as crs,geocoding: no-data, crs, geocoding, tags, descriptions, colours, "
-                     "display (all)")
+                     "What of it, such as crs,geocoding, among no-data, crs, geocoding, tags, descriptions, colours "
+                     "and display (all)")
         ->needs("--like");
     poVerb->add_flag("--json", poOptions->json, "As JSON");
-    poVerb->footer("Statistics that are stored are removed when the no-data value changes.\n"
+    poVerb->footer("Stored statistics are removed when the no-data value changes.\n"
                    "Examples:\n"
                    "  krv edit dem.tif --no-data -9999 --crs EPSG:32633 --origin 500000,5200000 --pixel-size 10\n"
                    "  krv edit result.tif --like scene.tif --copy crs,geocoding");

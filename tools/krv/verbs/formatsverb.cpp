@@ -118,8 +118,7 @@ int ListFormats(const std::string& name, bool bJson)
     if (oJson["formats"].empty())
         throw UsageError(
             fmt::format("formats: there is no format \"{}\"; there are {}", name, fmt::join(oNames, ", ")));
-    const std::string hint =
-        name.empty() ? "\n`krv formats NAME` tells what a new file of a format may be told.\n" : "";
+    const std::string hint = name.empty() ? "\n`krv formats NAME` lists the options of new files of a format.\n" : "";
     Print(bJson ? ToText(oJson) : TableText(oRows) + (name.empty() ? hint : options));
     return 0;
 }
@@ -151,7 +150,7 @@ void AddFormatsVerb(CLI::App& oApp, Selection& oSelection)
     poVerb->add_option("NAME", poOptions->name, "One format, with the options of its new files");
     auto* const poHome = poVerb->add_option(
         "--home", poOptions->home.folder,
-        "Make this folder a home of one's own, with the installed formats; set KRVHOME to it to use it");
+        "Make this folder a home of your own, with the installed formats; set KRVHOME to it to use it");
     poVerb
         ->add_option("--add", poOptions->home.plugins,
                      "Add this plug-in (.so, with its description .xml beside it) to that home; may be repeated")

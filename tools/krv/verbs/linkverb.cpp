@@ -28,7 +28,7 @@ void AddLinkVerb(CLI::App& oApp, Selection& oSelection)
     const auto poTarget = std::make_shared<std::string>();
     poVerb->add_option("TARGET", *poTarget, "The new file; one of that name is replaced")->required();
     poVerb->add_option("SOURCE", oSelection.file, "The file with the pixels; it stays as it is")->required();
-    poVerb->footer("The link is a relative path: two files that are moved together go on to belong to each other.\n"
+    poVerb->footer("The link is a relative path: two files that are moved together still belong to each other.\n"
                    "Channels of single bits are not linked.");
     poVerb->callback(
         [&oSelection, poTarget]

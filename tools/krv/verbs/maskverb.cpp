@@ -131,8 +131,8 @@ int RunMask(const std::string& file, Options& oOptions)
 
 void AddMaskVerb(CLI::App& oApp, Selection& oSelection)
 {
-    auto* const poVerb =
-        oApp.add_subcommand("mask", "A mask from polygons, bitmaps or no-data values: counts, stores and draws it");
+    auto* const poVerb = oApp.add_subcommand(
+        "mask", "Makes a mask from polygons, bitmaps or no-data values: counts, stores and draws it");
     const auto poOptions = std::make_shared<Options>();
     poVerb->add_option("FILE", oSelection.file, "The file")->required();
     poVerb
@@ -141,8 +141,8 @@ void AddMaskVerb(CLI::App& oApp, Selection& oSelection)
         ->expected(1)
         ->multi_option_policy(CLI::MultiOptionPolicy::TakeAll);
     AddWord(*poVerb, "--coordinates", poOptions->coordinates,
-            "Of the polygons: pixel ((0, 0) is the outer corner of the first) or map (the file's own system, the rule "
-            "for WKT; GeoJSON is longitude, latitude otherwise)",
+            "What the polygons are in: pixel ((0, 0) is the outer corner of the first) or map (the file's own system, "
+            "the default for WKT; GeoJSON is longitude, latitude by default)",
             {"pixel", "map"});
     poVerb
         ->add_option("--crs", poOptions->request.crs,
@@ -154,24 +154,26 @@ void AddMaskVerb(CLI::App& oApp, Selection& oSelection)
     poVerb->add_flag("--no-data", poOptions->noData,
                      "Pixels that equal the recorded no-data values, or with --no-data=-9999 that one");
     AddWord(*poVerb, "--rule", poOptions->rule,
-            "Whether any of the channels with a no-data value (the default) or all of them must equal theirs",
-            {"any", "all"});
-    poVerb->add_option("--channels", poOptions->channels, "No-data of these channels only, such as 1,3");
+            "Whether any (the default) or all of the channels that have a no-data value must equal it", {"any", "all"});
+    poVerb->add_option("--channels", poOptions->channels, "No-data of these channels only, such as 1,3 or 1-3");
     poVerb->add_option("--write", poOptions->write,
                        "Store it in this bitmap of the file, or in a new one (the word new)");
     auto* const poValidity = poVerb->add_flag(
         "--validity", poOptions->validity,
         "Store it as the image's validity mask, whose set bits are valid pixels: in the bitmap of "
-        "--write, else in the one that there is or a new one. No-data is stored so, as its complement, "
-        "unless --zone says otherwise");
+        "--write, else in the validity mask that there is, else in a new one. No-data is stored so, as "
+        "its complement, unless --zone is given");
     poVerb
         ->add_flag("--zone", poOptions->zone,
-                   "Store it as a zone, which says nothing of validity; the rule for all but no-data")
+                   "Store it as a zone, which says nothing of validity; the default for all but no-data")
         ->excludes(poValidity);
     poVerb->add_option("--png", poOptions->request.picture, "Draw it, set pixels white; the file is replaced");
     poVerb->add_option("--size", poOptions->request.pictureSize, "Longest side of the picture in pixels (1024)")
         ->check(CLI::Range(1, 16384));
     poVerb->add_flag("--json", poOptions->json, "As JSON");
+    poVerb->footer("Examples:\n"
+                   "  krv mask scene.tif --polygon lakes.geojson --write new\n"
+                   "  krv mask scene.tif --no-data=0 --validity");
     poVerb->callback(
         [&oSelection, poOptions]
         {

@@ -185,9 +185,9 @@ void AddOverviewsVerb(CLI::App& oApp, Selection& oSelection)
     const auto poOptions = std::make_shared<Options>();
     poVerb->add_option("FILE", oSelection.file, "The file; it is changed in place")->required();
     poVerb->add_option("--levels", poOptions->levels,
-                       "Reduction factors: 2,4,8,16 (powers of two, until a level is below 256 pixels)");
+                       "Reduction factors, such as 2,4,8,16 (powers of two, until a level is below 256 pixels)");
     AddWord(*poVerb, "--resampling", poOptions->resampling,
-            "How pixels are made: average, of indices of a colour table mode, unless said",
+            "How pixels are made; average by default, mode for indices of a colour table",
             {"average", "nearest", "mode", "bilinear", "cubic", "lanczos", "rms", "min", "max"});
     poVerb->add_option("--no-data", poOptions->noData, "The no-data value, in place of the recorded one");
     AddWindowOptions(*poVerb, poOptions->changed, "--changed",
@@ -196,7 +196,9 @@ void AddOverviewsVerb(CLI::App& oApp, Selection& oSelection)
                      "A pixel counts as valid when half of its source pixels are, instead of one");
     poVerb->add_flag("--nan-is-nodata", poOptions->building.mbNaNIsNoData, "Values that are no numbers are not valid");
     poVerb->add_flag("--power", poOptions->building.mbPower, "Average the power of complex values, not their parts");
-    poVerb->footer("No-data values, masks and alpha are respected. Stopped or failed, the file keeps what it had.");
+    poVerb->footer("No-data values, masks and alpha are respected. Stopped or failed, the file keeps what it had.\n"
+                   "Example:\n"
+                   "  krv overviews scene.tif --levels 2,4,8 --resampling cubic");
     poVerb->callback(
         [&oSelection, poOptions]
         {

@@ -43,8 +43,11 @@ std::vector<unsigned int> ParseNumbers(const std::string& text, const std::strin
             rest.remove_prefix(1);
             nLast = TakeNumber(rest, text, option);
         }
-        if (nLast < nFirst || nLast - nFirst >= MOST_NUMBERS)
-            throw UsageError(option + ": \"" + text + "\" holds a range that does not count upwards, or too far");
+        if (nLast < nFirst)
+            throw UsageError(option + ": \"" + text + "\" holds a range that does not count upwards");
+        if (nLast - nFirst >= MOST_NUMBERS)
+            throw UsageError(option + ": \"" + text + "\" holds a range of more than " + std::to_string(MOST_NUMBERS) +
+                             " numbers");
         for (unsigned int n = nFirst; n - nFirst <= nLast - nFirst; ++n)
             oNumbers.push_back(n);
         if (!rest.empty() && (rest.front() != ',' || rest.size() == 1))

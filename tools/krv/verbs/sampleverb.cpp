@@ -177,8 +177,8 @@ std::string ToCsv(const Options& oOptions, const SampleResult& oResult)
         const SampledPoint& oPoint = oResult.points[i];
         if (!oOptions.names.empty())
             text += Quoted(oOptions.names[i]) + ",";
-        text += krv::NumberText(oOptions.request.points[i].x) + "," + krv::NumberText(oOptions.request.points[i].y) +
-                "," + PixelText(oPoint.column) + "," + PixelText(oPoint.row);
+        text += fmt::format("{},{}", oOptions.request.points[i].x, oOptions.request.points[i].y) + "," +
+                PixelText(oPoint.column) + "," + PixelText(oPoint.row);
         for (std::size_t c = 0; c < oPoint.values.size(); ++c)
         {
             const bool bValid = oPoint.values[c].state == SampleState::eValid;
@@ -242,23 +242,24 @@ int RunSample(const std::string& file, Options& oOptions)
 
 void AddSampleVerb(CLI::App& oApp, Selection& oSelection)
 {
-    auto* const poVerb = oApp.add_subcommand("sample", "Values of a file at points");
+    auto* const poVerb = oApp.add_subcommand("sample", "Reads the values of a file at points");
     const auto poOptions = std::make_shared<Options>();
     const std::vector<std::pair<std::string, PointCoordinates>> oKinds{{"pixel", PointCoordinates::ePixels},
                                                                        {"map", PointCoordinates::eMap},
                                                                        {"lonlat", PointCoordinates::eGeographic}};
     poVerb->add_option("FILE", oSelection.file, "The file")->required();
-    poVerb->add_option("X Y", poOptions->coordinates,
-                       "Points, such as 500020 5199990 or 500020,5199990; without any, or for -, lines of the "
-                       "standard input: x, y and a name if there is one");
+    poVerb->add_option(
+        "X Y", poOptions->coordinates,
+        "Points, such as 500020 5199990 or 500020,5199990. Without any, or for -, they are read from the "
+        "standard input: a line has x, y and, if there is one, a name");
     auto* const poKind = AddChoice(
         *poVerb, "--coordinates", poOptions->request.coordinates,
-        "What they are: map (the file's reference system; the rule for a file that says where it lies), pixel "
-        "((0, 0) is the outer corner of the first; the rule for others) or lonlat (degrees on WGS 84)",
+        "What the points are in: map (the file's reference system; the default for a file that says where it lies), "
+        "pixel ((0, 0) is the outer corner of the first; the default for others) or lonlat (degrees on WGS 84)",
         oKinds);
     poVerb
         ->add_option("--crs", poOptions->request.crs,
-                     "Their reference system, such as EPSG:4258; x is always the easting or longitude")
+                     "The points' reference system, such as EPSG:4258; x is always the easting or longitude")
         ->excludes(poKind);
     poVerb->add_option("--channels", poOptions->channels, "Only these, such as 1,3 or 1-3");
     poVerb->add_option("--no-data", poOptions->noData, "The no-data value, in place of the recorded one");
@@ -267,8 +268,8 @@ void AddSampleVerb(CLI::App& oApp, Selection& oSelection)
                        "Height of the points above the ellipsoid in metres, where a sensor model places them (0)");
     poVerb->add_flag("--json", poOptions->json, "As JSON, with the reason where there is no value; else as CSV");
     poVerb->footer(
-        "A point takes the pixel that it lies in. No value is an empty field: outside of the image, no-data, "
-        "masked.\n"
+        "A point takes the value of the pixel that it lies in. The field is empty where there is none: outside\n"
+        "of the image, no-data, masked.\n"
         "Examples:\n"
         "  krv sample scene.tif 500020 5199990\n"
         "  krv sample scene.tif --coordinates lonlat < points.csv");

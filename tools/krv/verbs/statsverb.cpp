@@ -173,24 +173,27 @@ int RunStats(Selection& oSelection, Options& oOptions)
 
 void AddStatsVerb(CLI::App& oApp, Selection& oSelection)
 {
-    auto* const poVerb = oApp.add_subcommand(
-        "stats",
-        "Minimum, maximum, mean, standard deviation (of the population), valid and no-data counts per channel");
+    auto* const poVerb = oApp.add_subcommand("stats", "Computes minimum, maximum, mean, standard deviation (of the "
+                                                      "population) and counts of valid pixels per channel");
     const auto poOptions = std::make_shared<Options>();
     poVerb->add_option("FILES", poOptions->files, "The files; each is counted by itself")->required();
     poVerb->add_option("--channels", poOptions->channels, "Only these, such as 1,3 or 1-3");
     poVerb->add_option("--no-data", poOptions->noData, "The no-data value, in place of the recorded one");
-    poVerb->add_option("--percentiles", poOptions->percentiles, "Such as 2,50,98; the file is read twice");
+    poVerb->add_option("--percentiles", poOptions->percentiles,
+                       "Values below which this many percent lie, such as 2,50,98; the file is read twice");
     poVerb->add_flag("--histogram", poOptions->histogram,
-                     "How often values occur, in 256 bins; the file is read twice");
-    poVerb->add_option("--bins", poOptions->request.bins, "A histogram of so many bins")->check(CLI::Range(1, 65536));
+                     "How often values occur, in 256 bins from the smallest to the largest; the file is read twice");
+    poVerb->add_option("--bins", poOptions->request.bins, "A histogram of this many bins")->check(CLI::Range(1, 65536));
     poVerb->add_flag("--unscale", poOptions->request.unscale, "Multiply by the recorded scale and add the offset");
     poVerb->add_flag("--raw", poOptions->request.raw,
-                     "Count pixels that the validity mask or the alpha channel leaves out too");
-    poVerb->add_flag("--power", poOptions->request.power, "Of the power of a radar scene, all channels together");
+                     "Also count pixels that the validity mask or the alpha channel leaves out");
+    poVerb->add_flag("--power", poOptions->request.power,
+                     "Statistics of the power of a radar scene, all channels together");
     poVerb->add_flag("--json", poOptions->json, "As JSON; 64-bit integers are exact");
-    poVerb->footer("No-data values, pixels that the validity mask or the alpha channel leaves out, NaN and infinities "
-                   "take no part. Complex channels: of the magnitude.");
+    poVerb->footer("No-data values, pixels that the validity mask or the alpha channel leaves out, NaN and infinities\n"
+                   "take no part. Complex channels are counted by their magnitude.\n"
+                   "Example:\n"
+                   "  krv stats scene.tif --percentiles 2,98 --histogram --json");
     poVerb->callback(
         [&oSelection, poOptions]
         {

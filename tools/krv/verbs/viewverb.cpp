@@ -65,7 +65,7 @@ std::string Describe(const SourceFile& oFile, const QuickLook& oLook)
         const Stretch& oStretch = oLook.stretches[c];
         const bool bStored = oLook.power || oLook.decibels || oChoice.channels.size() <= c;
         const ValueScale oScale = bStored ? ValueScale() : oFile.GetScale(oChoice.channels[c]);
-        text += fmt::format(" {:.4g}..{:.4g}", oScale(oStretch.low), oScale(oStretch.high));
+        text += fmt::format("{} {:.4g} to {:.4g}", c == 0 ? "" : ",", oScale(oStretch.low), oScale(oStretch.high));
     }
     return text + (oLook.decibels ? " dB" : "");
 }
@@ -102,21 +102,26 @@ void AddViewVerb(CLI::App& oApp, Selection& oSelection)
     poVerb->add_option("--size", poOptions->look.size, "Longest side in pixels (1024); nothing is enlarged")
         ->check(CLI::Range(1, 16384));
     poVerb->add_option("--channels", poOptions->channels,
-                       "Three as red,green,blue or a single one; otherwise what the file says, else the first");
+                       "Three as red,green,blue, or a single one; by default those that the file says, else the first");
     AddChoice<StretchMode>(*poVerb, "--stretch", poOptions->look.stretch,
-                           "auto: 8-bit colours, and 8-bit data of good contrast, as they are, else percentile (the "
-                           "2nd black, the 98th white, without a black collar); none: 0 to 255 as they are; minmax",
+                           "What becomes black and white. auto (the default): 8-bit colours and 8-bit data of good "
+                           "contrast stay as they are, the rest is percentile. percentile: the 2nd and the 98th, a "
+                           "black collar left out. minmax: the smallest and the largest. none: 0 and 255",
                            {{"auto", StretchMode::eAuto},
                             {"none", StretchMode::eNone},
                             {"percentile", StretchMode::ePercentile},
                             {"minmax", StretchMode::eMinMax}});
     poVerb->add_flag("--power", poOptions->look.power,
-                     "The power of a radar scene, all channels together; complex files are shown so by themselves");
+                     "The power of a radar scene, all channels together; the default for complex files");
     poVerb->add_flag("--decibels", poOptions->look.decibels, "Values in decibels: 10 times their logarithm");
     poVerb->add_flag("--legend", poOptions->look.legend,
-                     "Below the picture what its levels or colours stand for; of one channel");
+                     "Below the picture, what its levels or colours stand for; for one channel");
     poVerb->add_option("--no-data", poOptions->noData, "The no-data value, in place of the recorded one");
     poVerb->add_flag("--nearest", poOptions->nearest, "Take single pixels instead of means: for class numbers");
+    poVerb->footer("Examples:\n"
+                   "  krv view scene.tif look.png --channels 4,3,2\n"
+                   "  krv view backscatter.tif look.jpg --decibels --legend\n"
+                   "  krv view scene.tif - --size 300 > look.png");
     poVerb->callback(
         [&oSelection, poOptions]
         {

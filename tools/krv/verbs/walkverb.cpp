@@ -136,11 +136,13 @@ void AddWalkVerb(CLI::App& oApp, Selection& oSelection)
         oApp.add_subcommand("walk", "Reads every tile with margins, as processing does, and says how fast");
     const auto poOptions = std::make_shared<Options>();
     poVerb->add_option("FILE", oSelection.file, "The file")->required();
-    poVerb->add_option("--channels", poOptions->channels, "Only these, such as 1,3");
-    poVerb->add_option("--margins", poOptions->margins, "Pixels left and right, above and below: 8,8 or 8 (0)");
-    poVerb->add_option("--tile", poOptions->tile, "Tile size: 512,512 or 512 (the format's own block)");
+    poVerb->add_option("--channels", poOptions->channels, "Only these, such as 1,3 or 1-3");
+    poVerb->add_option("--margins", poOptions->margins,
+                       "Pixels left and right, above and below, such as 8,4, or 8 for both (0)");
+    poVerb->add_option("--tile", poOptions->tile,
+                       "Tile size, such as 512,256, or 512 for both (what the format prefers)");
     AddChoice<eMarginBehaviour>(*poVerb, "--behaviour", poOptions->behaviour,
-                                "How pixels outside the image are made (mirror)",
+                                "How pixels outside of the image are made (mirror)",
                                 {{"exception", eException},
                                  {"replicate", eReplicate},
                                  {"mirror", eMirror},

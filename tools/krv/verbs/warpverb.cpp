@@ -55,7 +55,7 @@ int RunWarp(const std::string& file, Options& oOptions)
         throw UsageError("--size: \"" + oOptions.size + "\" is not columns,rows");
     if (!oOptions.resampling.empty())
         oRequest.method = krv::gobs::ParseResampling(oOptions.resampling);
-    const auto oNoData = ParseReals(oOptions.noData, "--nodata", 1, 1);
+    const auto oNoData = ParseReals(oOptions.noData, "--no-data", 1, 1);
     if (!oNoData.empty())
         oRequest.noData = oNoData.front();
     const WarpResult oResult = Warp(oRequest, oOptions.form, ShowProgress(), GetExecutor());
@@ -73,15 +73,16 @@ void AddWarpVerb(CLI::App& oApp, Selection& oSelection)
     poVerb->add_option("FILE", oSelection.file, "The file")->required();
     poVerb->add_option("OUT", poOptions->form.name, "The new file, which is replaced")->required();
     poVerb->add_option("--like", poOptions->request.like, "Into the grid of this file");
-    poVerb->add_option("--bounds", poOptions->bounds, "West,south,east,north in map units (the file's outline)");
+    poVerb->add_option("--bounds", poOptions->bounds,
+                       "The outer edges in map units: west,south,east,north (the file's outline)");
     poVerb->add_option("--resolution", poOptions->resolution,
                        "Map units of a pixel, such as 30, or of a column and a row (the file's)");
-    poVerb->add_option("--size", poOptions->size, "Columns,rows in place of a resolution");
+    poVerb->add_option("--size", poOptions->size, "Columns and rows, such as 2000,1500, in place of a resolution");
     AddWord(*poVerb, "--resampling", poOptions->resampling,
-            "How pixels are made: bilinear, of indices of a colour table mode, unless said",
+            "How pixels are made; bilinear by default, mode for indices of a colour table",
             {"nearest", "bilinear", "cubic", "lanczos", "average", "mode"});
     poVerb->add_option("--channels", poOptions->channels, "Only these, in this order, such as 3,1");
-    poVerb->add_option("--nodata", poOptions->noData,
+    poVerb->add_option("--no-data,--nodata", poOptions->noData,
                        "The value of pixels without a source (the file's own; else a mask tells them)");
     poVerb
         ->add_option("--degree", poOptions->request.degree,
@@ -93,7 +94,9 @@ void AddWarpVerb(CLI::App& oApp, Selection& oSelection)
                        "The new file's format (`krv formats`); else by its extension, TIF when it has none");
     poVerb->add_option("--options", poOptions->form.options,
                        "\"KEY=VALUE ...\" of the format, such as \"COMPRESS=ZSTD BLOCKXSIZE=512\"");
-    poVerb->footer("No-data values, masks and alpha are respected: what is not valid takes no part.");
+    poVerb->footer("No-data values, masks and alpha are respected: what is not valid takes no part.\n"
+                   "Example:\n"
+                   "  krv warp scene.tif coarse.tif --resolution 60 --resampling average");
     poVerb->callback(
         [&oSelection, poOptions]
         {
