@@ -114,8 +114,10 @@ TEST_F(MultiTypeWriterTest, EveryChannelGoesToItsOwnPlaceInItsOwnType)
                       Channel(pixels, gobs::eDT_32R, n, nCount, TYPES[oList[n] - 1]))
                 << "channel " << oList[n];
         if (nCount == 4)
+        {
             EXPECT_EQ(ReadPixels(BasicReader(&oDataset, {3}, false)), std::string(WIDTH * HEIGHT, '\0'))
                 << "not listed";
+        }
         MultiTypeReader oReader(&oDataset, oList, gobs::eDT_32R, eOwnPlace);
         EXPECT_EQ(ReadPixels(oReader), pixels);
     }
