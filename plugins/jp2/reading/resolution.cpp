@@ -19,7 +19,7 @@ constexpr std::uint32_t USUAL_BLOCK = 256;
 constexpr std::uint32_t MOST_TILES = 32; // in a row or column of a block
 // Areas end so far from the ends of code-blocks that the filters reach into no further ones: multiples of such a size
 // lie inside code-blocks of each band.
-constexpr std::uint32_t AREA_STEP = 1024;
+constexpr std::uint32_t AREA_STEP = 512;
 constexpr std::uint32_t AREA_SHIFT = 48;
 
 struct Axis

@@ -16,7 +16,7 @@ class Resolution
 {
 public:
     // Of the samples of a block while it is decoded, by each thread.
-    static constexpr std::uint64_t BLOCK_BYTES = std::uint64_t{128} << 20;
+    static constexpr std::uint64_t BLOCK_BYTES = std::uint64_t{208} << 20;
 
     // nReduce: resolutions left out. nComponents: how many are decoded together at most.
     Resolution(const Codestream& oStream, unsigned int nReduce, std::size_t nComponents,
