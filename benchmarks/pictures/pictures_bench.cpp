@@ -106,18 +106,18 @@ int main(int nArguments, char** pArguments)
         ReadTiles(file, &oOurs);
         if (oAlone != oOurs)
             throw std::runtime_error("the picture was read wrongly");
-        const std::vector<double> oTimes = MedianSeconds({{"libvips",
-                                                           [&]
-                                                           {
-                                                               ReadByVips(file, oAlone);
-                                                           }},
-                                                          {"library",
-                                                           [&]
-                                                           {
-                                                               ReadTiles(file);
-                                                           }}},
-                                                         static_cast<int>(oArguments.GetNumber("rounds", 5)),
-                                                         Clock::eProcessor);
+        const std::vector<double> oTimes =
+            MedianSeconds({{"libvips",
+                            [&]
+                            {
+                                ReadByVips(file, oAlone);
+                            }},
+                           {"library",
+                            [&]
+                            {
+                                ReadTiles(file);
+                            }}},
+                          static_cast<int>(oArguments.GetNumber("rounds", 5)), Clock::eProcessor);
         PrintRow(std::string("whole ") + pType, oTimes[0] / oTimes[1], 0.95,
                  Number(1e-6 * nSize * nSize / oTimes[1], 1) + " million pixels a second");
     }
