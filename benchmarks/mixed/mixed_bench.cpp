@@ -165,7 +165,7 @@ void MeasureFiles(IDataset& oDataset, const std::vector<Layer>& oLayers, const D
 }
 
 // The tiles of an image are written over and over: none is new memory. One raster takes the place of all, as a program
-// has that fills one and writes it.
+// has that fills one and writes it. Processor time.
 void MeasureWriting(const std::string& name, const std::vector<DataType>& oTypes, unsigned int nTile)
 {
     constexpr unsigned int SIZE = 2048;
@@ -204,7 +204,7 @@ void MeasureWriting(const std::string& name, const std::vector<DataType>& oTypes
                                                     oWriter.WriteRaster(&oTile);
                                                 });
                                         }}},
-                                      ROUNDS);
+                                      ROUNDS, Clock::eProcessor);
     PrintRow(name + ", tiles of " + std::to_string(nTile), oTimes[0] / oTimes[1], 0.75,
              Number(static_cast<double>(oCopy.size()) / oTimes[1] / 1e9) + " GB/s of rasters");
 }

@@ -140,45 +140,55 @@ void MultiTypeIO::WritePixels(const PixelRect& oRect, const unsigned char* pSour
 {
     if (mpoChanges->mbStrict)
         return WriteBand(oRect, pSource, nPitch);
-    const auto oWrite = [&](const PixelRect& oPart)
-    {
-        const unsigned char* const pPart =
-            pSource + (oPart.mnY - oRect.mnY) * nPitch + (oPart.mnX - oRect.mnX) * mnPixelBytes;
-        if (!mbMemory || !WriteInPlace(oPart, pPart, nPitch))
-            WriteBand(oPart, pPart, nPitch);
-    };
-    if (mbMemory)
-        ForEachPiece(oRect, oWrite);
-    else
-        ForEachBand(oRect, mnBlockHeight, oWrite);
+    ForEachBand(oRect, mbMemory ? MemoryTiles::TILE_SIZE : mnBlockHeight,
+                [&](const PixelRect& oBand)
+                {
+                    const unsigned char* const pBand = pSource + (oBand.mnY - oRect.mnY) * nPitch;
+                    if (!mbMemory || !WriteInPlace(oBand, pBand, nPitch))
+                        WriteBand(oBand, pBand, nPitch);
+                });
 }
 
-// Straight to where the pixels stay. False, and nothing is done, where a group has them otherwise.
-bool MultiTypeIO::WriteInPlace(const PixelRect& oPiece, const unsigned char* pSource, std::size_t nPitch)
+// Straight to where the pixels stay, row by row through all tiles of a band, so that the source is read in its order.
+// False, and nothing is done, where a group has them otherwise.
+bool MultiTypeIO::WriteInPlace(const PixelRect& oBand, const unsigned char* pSource, std::size_t nPitch)
 {
-    std::vector<unsigned char*> oTargets;
-    std::vector<std::size_t> oPitches(moGroups.size());
-    bool bTight = nPitch == oPiece.mnWidth * mnPixelBytes;
-    for (const WriterGroup& oGroup : moGroups)
+    struct Piece
     {
-        std::size_t& nOwn = oPitches[oTargets.size()];
-        oTargets.push_back(oGroup.mpoMemory->BeginWriting(oPiece, nOwn));
-        if (oTargets.back() == nullptr)
-            return false;
-        bTight = bTight && nOwn == oPiece.mnWidth * oGroup.moPositions.size() *
-                                       (oGroup.mpoWriter->GetDataType().GetValueBits() / 8);
-    }
+        PixelRect moRect;
+        std::vector<unsigned char*> moTargets;
+        std::vector<std::size_t> moPitches;
+    };
+    std::vector<Piece> oPieces;
+    bool bInPlace = true, bTight = nPitch == oBand.mnWidth * mnPixelBytes;
+    ForEachPiece(oBand,
+                 [&](const PixelRect& oRect)
+                 {
+                     Piece& oPiece = oPieces.emplace_back(Piece{oRect, {}, {}});
+                     for (const WriterGroup& oGroup : moGroups)
+                     {
+                         std::size_t nOwn = 0;
+                         oPiece.moTargets.push_back(oGroup.mpoMemory->BeginWriting(oRect, nOwn));
+                         oPiece.moPitches.push_back(nOwn);
+                         bInPlace = bInPlace && oPiece.moTargets.back() != nullptr;
+                         bTight = bTight && nOwn == oBand.mnWidth * oGroup.moPositions.size() *
+                                                        (oGroup.mpoWriter->GetDataType().GetValueBits() / 8);
+                     }
+                 });
+    if (!bInPlace)
+        return false;
     std::vector<std::uint64_t> oChanged(moSplitPositions.size());
-    const unsigned int nRuns = bTight ? 1 : oPiece.mnHeight;
-    const std::uint64_t nPixels = std::uint64_t{oPiece.mnWidth} * oPiece.mnHeight / nRuns;
-    std::vector<unsigned char*> oRow(oTargets.size());
+    const unsigned int nRuns = bTight ? 1 : oBand.mnHeight, nRows = oBand.mnHeight / nRuns;
+    std::vector<unsigned char*> oRow(moGroups.size());
     for (unsigned int nRun = 0; nRun < nRuns; ++nRun)
-    {
-        for (std::size_t n = 0; n < oTargets.size(); ++n)
-            oRow[n] = oTargets[n] + nRun * oPitches[n];
-        moSplitter->Run(pSource + nRun * nPitch, oRow, nPixels, oChanged.data());
-    }
-    TakeChanges(oPiece, oChanged);
+        for (const Piece& oPiece : oPieces)
+        {
+            for (std::size_t n = 0; n < oRow.size(); ++n)
+                oRow[n] = oPiece.moTargets[n] + nRun * oPiece.moPitches[n];
+            moSplitter->Run(pSource + nRun * nPitch + (oPiece.moRect.mnX - oBand.mnX) * mnPixelBytes, oRow,
+                            std::uint64_t{oPiece.moRect.mnWidth} * nRows, oChanged.data());
+        }
+    TakeChanges(oBand, oChanged);
     return true;
 }
 

@@ -52,7 +52,7 @@ private:
     std::size_t GetPixelBytes() const override { return mnPixelBytes; }
     void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) override;
     void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) override;
-    bool WriteInPlace(const PixelRect& oPiece, const unsigned char* pSource, std::size_t nPitch);
+    bool WriteInPlace(const PixelRect& oBand, const unsigned char* pSource, std::size_t nPitch);
     void WriteBand(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch);
     void TakeChanges(const PixelRect& oRect, const std::vector<std::uint64_t>& oChanged);
 
