@@ -165,7 +165,7 @@ TEST(Warp, WhatMakesNoSenseIsRefused)
                             {{file, target, "--bounds", "1,2,3"}, 2, "--bounds"},
                             {{file, target, "--bounds", "3,2,1,5"}, 2, "--bounds"},
                             {{file, target, "--like", file, "--size", "3,3"}, 2, "as it is"},
-                            {{file, target, "--nodata", "x"}, 2, "--nodata"}});
+                            {{file, target, "--nodata", "x"}, 2, "--no-data"}});
     ExpectRefusals("convert", {{{file, target, "--bounds", "1,2,3,4"}, 2, "none of its pixels"}});
     EXPECT_FALSE(std::filesystem::exists(target));
 }
