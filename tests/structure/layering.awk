@@ -26,6 +26,12 @@ BEGIN {
     for (n in names)
         opens[names[n], "datasources/iomanager"] = 1;
     opens["plugins/mosaic", "datasources/mosaic"] = 1;
+    # The rooms of that base, by their order; what lies in the folder itself comes last.
+    split("codec file geotiff image sidecar writing", names, " ");
+    split("1 1 1 2 2 3", steps, " ");
+    for (n in names)
+        step[names[n]] = steps[n] + 0;
+    lastStep = 4;
 
     # Libraries of others, and the only folders that may know them.
     home["^(xercesc|xalanc)/"] = "^(toolkit/xml|datasources/iomanager)/";
@@ -69,6 +75,25 @@ function isOpening(to,    path)
     return 0;
 }
 
+# The room of the plug-ins' base that a path lies in; empty in the folder itself.
+function room(path,    parts, count)
+{
+    count = split(path, parts, "/");
+    return count > 3 ? parts[3] : "";
+}
+
+function stepOf(path)
+{
+    return room(path) in step ? step[room(path)] : lastStep;
+}
+
+function checkRooms(target)
+{
+    if (target ~ /^plugins\/support\// && FILENAME ~ /^plugins\/support\// && room(FILENAME) != room(target) &&
+        stepOf(target) >= stepOf(FILENAME))
+        complain("plugins/support/" room(FILENAME) " does not include " target ": its rooms point one way");
+}
+
 function checkOrder(from, to, target)
 {
     if (from == to || (FILENAME, to) in upward)
@@ -90,6 +115,7 @@ function checkOrder(from, to, target)
 function checkOwn(target)
 {
     checkOrder(folder(FILENAME), folder(target), target);
+    checkRooms(target);
     if ((getline unused < (root "/" target)) < 0)
         complain("no such file from the root: " target);
     close(root "/" target);

@@ -1,8 +1,8 @@
 #include "plugins/support/sidecar/modelsidecars.h"
 
+#include "plugins/support/file/newfile.h"
 #include "plugins/support/sidecar/rpctext.h"
 #include "plugins/support/sidecar/sidecarfile.h"
-#include "plugins/support/writing/newfile.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <filesystem>

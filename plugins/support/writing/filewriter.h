@@ -1,7 +1,7 @@
 #pragma once
 
 #include "plugins/support/file/file.h"
-#include "plugins/support/writing/newfile.h"
+#include "plugins/support/file/newfile.h"
 
 #include <memory>
 #include <string>

@@ -1,7 +1,7 @@
 #include "plugins/support/writing/setaside.h"
 
 #include "plugins/support/file/file.h"
-#include "plugins/support/writing/newfile.h"
+#include "plugins/support/file/newfile.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <cerrno>

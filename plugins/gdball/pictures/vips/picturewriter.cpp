@@ -2,7 +2,7 @@
 
 #include "plugins/gdball/pictures/vips/session.h"
 #include "plugins/gdball/pictures/vips/streams.h"
-#include "plugins/support/writing/newfile.h"
+#include "plugins/support/file/newfile.h"
 #include "toolkit/exceptions/exceptions.h"
 
 #include <algorithm>

@@ -1,4 +1,4 @@
-#include "plugins/support/writing/newfile.h"
+#include "plugins/support/file/newfile.h"
 
 #include "toolkit/exceptions/exceptions.h"
 
