@@ -186,9 +186,10 @@ unsigned int CopyBitmap(const SourceFile& oSource, unsigned int nFrom, const Met
     const auto& oFrom = dynamic_cast<const IBitmapDataset&>(oSource.GetDataset());
     IBitmapDataset& oTo = *oTarget.Find<IBitmapDataset>();
     const unsigned int nTo = oTo.CreateBitmap();
-    oTo.SetBitmapDescription(nTo, oFrom.GetBitmapDescription(nFrom));
+    // What it is comes before what it is called: some formats have room for validity alone.
     if (!oTags.empty())
         oTo.SetBitmapMetadata(nTo, oTags);
+    oTo.SetBitmapDescription(nTo, oFrom.GetBitmapDescription(nFrom));
     const auto Open = [nFrom](const SourceFile& oFile)
     {
         auto& oBitmaps = dynamic_cast<IBitmapDataset&>(oFile.GetDataset());

@@ -420,7 +420,9 @@ std::vector<Finding> CheckFile(const std::string& file, const std::vector<Loaded
         oFindings.push_back({false, "file " + file, "no format recognises it: " + seems, {}});
     else if (!bRecognised)
         oFindings.push_back({false, "file " + file, "no format recognises it",
-                             "install the plug-in of its format, or convert it to one that `krv formats` lists"});
+                             "install the plug-in of its format, or convert it to one that `krv formats` lists; where "
+                             "it holds plain pixels, which no header beside it describes, write an ENVI header " +
+                                 file + ".hdr with their size, data type and byte order"});
     return oFindings;
 }
 

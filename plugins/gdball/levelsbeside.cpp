@@ -5,6 +5,7 @@
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/metadata/levelbook.h"
+#include "plugins/support/sidecar/levelsfile.h"
 #include "plugins/support/sidecar/sidecarfile.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
@@ -19,9 +20,8 @@ using namespace krv::datasources;
 namespace
 {
 
-constexpr char ENDING[] = ".ovr";
-// The first page, as its own record numbers it.
-constexpr unsigned int FIRST_PAGE = 1;
+using support::FIRST_LEVEL_PAGE;
+constexpr const char* ENDING = support::LEVELS_ENDING;
 
 // A level as the image numbers it, over what the file has of it.
 class LevelIO : public IOverviewIO
@@ -170,7 +170,7 @@ void LevelsBeside::ListLevels()
         if (const auto oLevel = FindLevelNumber(moImage.mnWidth, moImage.mnHeight, nWidth, nHeight))
             moLevels.emplace(*oLevel, nOwn);
     };
-    Add(FIRST_PAGE, GetRaster().GetWidth(), GetRaster().GetHeight());
+    Add(FIRST_LEVEL_PAGE, GetRaster().GetWidth(), GetRaster().GetHeight());
     for (const unsigned int nOwn : GetOwn().GetLevels())
         Add(nOwn, GetOwn().GetLevelWidth(nOwn), GetOwn().GetLevelHeight(nOwn));
 }
@@ -194,8 +194,8 @@ unsigned int LevelsBeside::FindOwn(unsigned int nLevel, const Place& oPlace) con
 IRasterIO* LevelsBeside::OpenLevel(unsigned int nLevel, const std::vector<unsigned int>& oChannels)
 {
     const unsigned int nOwn = FindOwn(nLevel, Place::Current());
-    std::unique_ptr<IRasterIO> poOwn(nOwn == FIRST_PAGE ? GetRaster().GetRasterIO(oChannels)
-                                                        : GetOwn().GetOverviewIO(nOwn, oChannels));
+    std::unique_ptr<IRasterIO> poOwn(nOwn == FIRST_LEVEL_PAGE ? GetRaster().GetRasterIO(oChannels)
+                                                              : GetOwn().GetOverviewIO(nOwn, oChannels));
     return new LevelIO(std::move(poOwn), nLevel);
 }
 
@@ -214,7 +214,7 @@ void LevelsBeside::MakeLevel(unsigned int nLevel)
                                                      DivideUp(moImage.mnHeight, nLevel), moImage.moTypes);
         mpoFile = std::move(poNew);
         moFileName = name;
-        moLevels = {{nLevel, FIRST_PAGE}};
+        moLevels = {{nLevel, FIRST_LEVEL_PAGE}};
         return;
     }
     const unsigned int nFirst = moLevels.begin()->first;
@@ -229,7 +229,7 @@ void LevelsBeside::MakeLevel(unsigned int nLevel)
 void LevelsBeside::DropLevel(unsigned int nLevel)
 {
     const unsigned int nOwn = FindOwn(nLevel, Place::Current());
-    if (nOwn != FIRST_PAGE)
+    if (nOwn != FIRST_LEVEL_PAGE)
         GetOwn().DeleteLevel(nOwn);
     else if (moLevels.size() > 1)
         Fail("the largest level cannot be deleted before the others", Place::Current());
@@ -247,19 +247,19 @@ bool LevelsBeside::IsValid(unsigned int nChannel, unsigned int nLevel) const
     const auto oFound = moLevels.find(nLevel);
     if (oFound == moLevels.end() || nChannel == 0 || nChannel > moImage.moTypes.size())
         return false;
-    if (oFound->second != FIRST_PAGE)
+    if (oFound->second != FIRST_LEVEL_PAGE)
         return GetOwn().IsValid(nChannel, oFound->second);
-    return IsLevelValid(mpoFile->ReadAuxiliaryData(), nChannel, FIRST_PAGE);
+    return IsLevelValid(mpoFile->ReadAuxiliaryData(), nChannel, FIRST_LEVEL_PAGE);
 }
 
 void LevelsBeside::SetValid(unsigned int nChannel, unsigned int nLevel, bool bValid)
 {
     const unsigned int nOwn = FindOwn(nLevel, Place::Current());
     mbForgotten = mbForgotten && !bValid;
-    if (nOwn != FIRST_PAGE)
+    if (nOwn != FIRST_LEVEL_PAGE)
         return GetOwn().SetValid(nChannel, nOwn, bValid);
     AuxiliaryData oBook = mpoFile->ReadAuxiliaryData();
-    SetLevelValid(oBook, nChannel, FIRST_PAGE, bValid, moMethod);
+    SetLevelValid(oBook, nChannel, FIRST_LEVEL_PAGE, bValid, moMethod);
     mpoFile->WriteAuxiliaryData(oBook);
 }
 
@@ -267,16 +267,15 @@ void LevelsBeside::ForgetLevels()
 {
     if (mbForgotten || !mpoFile || meMode != eUpdate)
         return;
-    for (const auto& [nLevel, nOwn] : moLevels)
-        for (unsigned int nChannel = 1; nChannel <= moImage.moTypes.size(); ++nChannel)
-            SetValid(nChannel, nLevel, false);
+    support::ForgetLevels(*mpoFile);
+    mpoFile->Synchronize(); // before the pixels are in their file
     mbForgotten = true;
 }
 
 std::pair<unsigned int, unsigned int> LevelsBeside::GetSize(unsigned int nLevel) const
 {
     const unsigned int nOwn = FindOwn(nLevel, Place::Current());
-    if (nOwn == FIRST_PAGE)
+    if (nOwn == FIRST_LEVEL_PAGE)
         return {GetRaster().GetWidth(), GetRaster().GetHeight()};
     return {GetOwn().GetLevelWidth(nOwn), GetOwn().GetLevelHeight(nOwn)};
 }
@@ -284,14 +283,14 @@ std::pair<unsigned int, unsigned int> LevelsBeside::GetSize(unsigned int nLevel)
 AuxiliaryData LevelsBeside::ReadRecord(unsigned int nLevel) const
 {
     const unsigned int nOwn = FindOwn(nLevel, Place::Current());
-    return nOwn == FIRST_PAGE ? mpoFile->ReadAuxiliaryData().GetCleanedMeta() : GetOwn().GetAuxiliaryData(nOwn);
+    return nOwn == FIRST_LEVEL_PAGE ? mpoFile->ReadAuxiliaryData().GetCleanedMeta() : GetOwn().GetAuxiliaryData(nOwn);
 }
 
 std::string LevelsBeside::GetMethod() const
 {
     if (!moMethod.empty() || !mpoFile)
         return moMethod;
-    return GetLevelMethod(mpoFile->ReadAuxiliaryData(), FIRST_PAGE);
+    return GetLevelMethod(mpoFile->ReadAuxiliaryData(), FIRST_LEVEL_PAGE);
 }
 
 void LevelsBeside::SetMethod(const std::string& name)

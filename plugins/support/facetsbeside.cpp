@@ -1,8 +1,10 @@
 #include "plugins/support/facetsbeside.h"
 
 #include "plugins/support/image/stackedio.h"
+#include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/mathmodel/rpcmodel.h"
+#include "toolkit/nspio/warning.h"
 
 #include <utility>
 
@@ -49,10 +51,7 @@ unsigned int FacetsBeside::CreateBitmap()
 {
     const Place oPlace = Place::Current();
     moDataset.CheckWritingBeside("bitmaps cannot be added", oPlace);
-    if (!moDataset.GetSidecars().ListMasks().empty())
-        RefuseBeside("validity masks lie beside the file already, and there is no place for other bitmaps", oPlace);
-    moDataset.GetSidecars().MakeMask();
-    return 1;
+    return moDataset.GetSidecars().MakeMask();
 }
 
 std::string FacetsBeside::GetBitmapDescription(unsigned int nBitmap) const
@@ -61,6 +60,14 @@ std::string FacetsBeside::GetBitmapDescription(unsigned int nBitmap) const
 }
 
 // Others would take a zone beside the file for validity.
+void FacetsBeside::RefuseZone(Sidecars& oSidecars, const Place& oPlace) const
+{
+    oSidecars.DropZone();
+    RefuseBeside("a zone cannot be kept beside the file: a bitmap without a description, the validity mask, can, or "
+                 "one that is tagged as that of a channel",
+                 oPlace);
+}
+
 void FacetsBeside::SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription)
 {
     const Place oPlace = Place::Current();
@@ -68,16 +75,17 @@ void FacetsBeside::SetBitmapDescription(unsigned int nBitmap, const std::string&
     Sidecars& oSidecars = FindMask(nBitmap, oPlace);
     if (oDescription == oSidecars.DescribeMask(nBitmap))
         return;
-    if (!oDescription.empty())
-    {
-        if (oSidecars.IsZone())
-            oSidecars.DropMasks();
-        RefuseBeside("a zone cannot be kept beside the file: a bitmap without a description, the validity mask, can",
-                     oPlace);
-    }
-    if (!oSidecars.IsZone())
+    if (oSidecars.IsZone(nBitmap) && oDescription.empty())
+        return oSidecars.DeclareMask(0);
+    if (oSidecars.IsZone(nBitmap))
+        RefuseZone(oSidecars, oPlace);
+    if (oSidecars.GetMaskTags(nBitmap).empty())
+        RefuseBeside("the mask of the image has no description", oPlace);
+    if (oDescription.empty())
         RefuseBeside("the mask of a channel cannot become the one of the image", oPlace);
-    oSidecars.DeclareMask();
+    krv::nspio::Warning::Warn(moDataset.GetFileName() + ": the description \"" + oDescription +
+                                  "\" of a mask beside the file is not kept",
+                              oPlace);
 }
 
 krv::datasources::MetadataMap FacetsBeside::GetBitmapMetadata(unsigned int nBitmap) const
@@ -87,8 +95,19 @@ krv::datasources::MetadataMap FacetsBeside::GetBitmapMetadata(unsigned int nBitm
 
 void FacetsBeside::SetBitmapMetadata(unsigned int nBitmap, const krv::datasources::MetadataMap& oMetadata)
 {
-    if (oMetadata != GetBitmapMetadata(nBitmap))
-        RefuseBeside("a mask beside the file has no metadata");
+    const Place oPlace = Place::Current();
+    Sidecars& oSidecars = FindMask(nBitmap, oPlace);
+    if (oMetadata == oSidecars.GetMaskTags(nBitmap))
+        return;
+    moDataset.CheckWritingBeside("bitmaps cannot be written", oPlace);
+    if (!oSidecars.IsZone(nBitmap))
+        RefuseBeside("a mask beside the file has no metadata", oPlace);
+    const auto oOwner = oMetadata.find(krv::datasources::VALIDITY_OF_CHANNEL);
+    const unsigned int nChannel =
+        oOwner == oMetadata.end() ? 0 : krv::ParseNumber<unsigned int>(oOwner->second).value_or(0);
+    if (nChannel == 0 || oMetadata.size() > 1)
+        RefuseZone(oSidecars, oPlace);
+    oSidecars.DeclareMask(nChannel);
 }
 
 std::vector<unsigned int> FacetsBeside::GetMathModelList() const

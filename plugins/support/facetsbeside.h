@@ -12,7 +12,9 @@ namespace krv::plugins::support
 
 // The bitmaps and sensor models of a format whose files have no place for them: those that lie beside. A dataset of
 // such a format derives from this as well. Bitmap 1 is the mask of the image, or, where each channel has its own,
-// bitmap n is the one of channel n; there are no zones. A rational polynomial model is written as a text.
+// bitmap n is the one of channel n; there are no zones. A new one is declared before it is stored: by an empty
+// description the image's, by the tag VALIDITY_OF_CHANNEL, before it is opened, that of a channel. A rational
+// polynomial model is written as a text.
 class FacetsBeside : public krv::datasources::IBitmapDataset, public krv::datasources::IMathModelDataset
 {
 public:
@@ -40,6 +42,7 @@ protected:
     explicit FacetsBeside(const Dataset* poDataset) : moDataset(*poDataset) {}
 
 private:
+    [[noreturn]] void RefuseZone(Sidecars& oSidecars, const Place& oPlace) const;
     [[noreturn]] void RefuseBeside(const std::string& what, const Place& oPlace = Place::Current()) const;
     // The sidecars, which have that mask.
     Sidecars& FindMask(unsigned int nBitmap, const Place& oPlace = Place::Current()) const;

@@ -1,5 +1,6 @@
 #include "plugins/support/codec/bits.h"
 
+#include "toolkit/raster/swapbytes.h"
 #include "toolkit/simd/memoryaccess.h"
 #include "toolkit/simd/vector16.h"
 
@@ -14,7 +15,6 @@ namespace
 
 using simd::Load;
 using simd::Store;
-using simd::Swap;
 
 // Bits packed most significant first.
 struct BitSource
@@ -341,18 +341,6 @@ constexpr std::uint64_t ReverseEach(std::uint64_t nValue)
     return ((nValue >> 4) & 0x0F0F0F0F0F0F0F0FU) | ((nValue & 0x0F0F0F0F0F0F0F0FU) << 4);
 }
 
-template <typename T>
-void SwapEach(const unsigned char* source, unsigned char* destination, std::size_t nCount)
-{
-    std::size_t i = 0;
-#if defined(KRV_VECTOR16)
-    for (constexpr std::size_t STEP = 16 / sizeof(T); i + STEP <= nCount; i += STEP)
-        simd::StoreVector(destination + i * sizeof(T), simd::SwapVector<T>(simd::LoadVector(source + i * sizeof(T))));
-#endif
-    for (; i < nCount; ++i)
-        Store(destination + i * sizeof(T), Swap(Load<T>(source + i * sizeof(T))));
-}
-
 void SwapOdd(const unsigned char* source, unsigned char* destination, std::size_t nCount, std::size_t nSampleBytes)
 {
     std::array<unsigned char, 8> oSample{};
@@ -493,17 +481,9 @@ void ReverseBits(const unsigned char* source, unsigned char* destination, std::s
 
 void SwapBytes(const unsigned char* source, unsigned char* destination, std::size_t nCount, std::size_t nSampleBytes)
 {
-    switch (nSampleBytes)
-    {
-    case 2:
-        return SwapEach<std::uint16_t>(source, destination, nCount);
-    case 4:
-        return SwapEach<std::uint32_t>(source, destination, nCount);
-    case 8:
-        return SwapEach<std::uint64_t>(source, destination, nCount);
-    default:
-        return SwapOdd(source, destination, nCount, nSampleBytes);
-    }
+    if (nSampleBytes == 2 || nSampleBytes == 4 || nSampleBytes == 8)
+        return raster::SwapBytes(source, destination, nCount, nSampleBytes);
+    SwapOdd(source, destination, nCount, nSampleBytes);
 }
 
 } // namespace krv::plugins::codec

@@ -14,17 +14,19 @@ namespace
 {
 
 constexpr std::uint64_t MOST_BYTES = std::uint64_t{1} << 62;
-// What is turned round, or picked apart, piece by piece stays in the processor's second cache.
+// What is picked apart piece by piece stays in the processor's second cache, beside what is made of it.
 constexpr std::size_t SLICE_BYTES = std::size_t{128} << 10;
+// What is turned round in its place has that cache for itself.
+constexpr std::size_t SWAPPED_BYTES = std::size_t{256} << 10;
 // A call to the system costs about as much as copying this many bytes.
 constexpr std::uint64_t CALL_BYTES = 4096;
 constexpr std::size_t TILE_BYTES = std::size_t{1} << 20;
 constexpr unsigned int LEAST_TILE_ROWS = 16;
 constexpr unsigned int MOST_TILE_ROWS = 512;
 
-unsigned int CountSliceRows(std::size_t nRowBytes)
+unsigned int CountSliceRows(std::size_t nRowBytes, std::size_t nSliceBytes = SLICE_BYTES)
 {
-    return static_cast<unsigned int>(std::max<std::size_t>(1, SLICE_BYTES / std::max<std::size_t>(1, nRowBytes)));
+    return static_cast<unsigned int>(std::max<std::size_t>(1, nSliceBytes / std::max<std::size_t>(1, nRowBytes)));
 }
 
 // Beyond MOST_BYTES no file reaches: sums and products stop there.
@@ -133,22 +135,8 @@ void PlainSource::ReadPlane(unsigned int nPlane, const PixelRect& oRect, unsigne
     };
     if (!mbSwap)
         return ReadRows(oRect, pTarget);
-    // Read into memory that is near, and turned round on its way to where it belongs.
-    const std::size_t nPartBytes = moLayout.GetPlane(nPlane).moType.GetBits() / 8;
-    if (nRowBytes == moPlacements[nPlane].mnRowPitch && nRowBytes == nPitch)
-    {
-        const std::size_t nBytes = nRowBytes * oRect.mnHeight;
-        const std::uint64_t nOffset = GetOffset(nPlane, oRect.mnX, oRect.mnY);
-        for (std::size_t nDone = 0; nDone < nBytes; nDone += std::min(SLICE_BYTES, nBytes - nDone))
-        {
-            const std::size_t nSlice = std::min(SLICE_BYTES, nBytes - nDone);
-            unsigned char* const pSlice = moScratch.Get(nSlice);
-            mpoFile->Read(nOffset + nDone, pSlice, nSlice);
-            codec::SwapBytes(pSlice, pTarget + nDone, nSlice / nPartBytes, nPartBytes);
-        }
-        return;
-    }
-    ForEachSlice(oRect, CountSliceRows(nRowBytes),
+    // Turned round where they were read to, while they are near.
+    ForEachSlice(oRect, CountSliceRows(nRowBytes, SWAPPED_BYTES),
                  [&](const PixelRect& oSlice, std::size_t nRow)
                  {
                      ReadRows(oSlice, pTarget + nRow * nPitch);

@@ -9,9 +9,11 @@
 #include "datasources/iomanager/datasetmanager.h"
 #include "gobs/raster/datatype.h"
 #include "plugins/support/file/newfile.h"
+#include "plugins/support/sidecar/levelsfile.h"
 #include "plugins/support/sidecar/modelsidecars.h"
 #include "plugins/support/sidecar/sidecarfile.h"
 #include "plugins/support/sidecar/worldfile.h"
+#include "toolkit/core/core.h"
 #include "toolkit/core/lettercase.h"
 #include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -124,6 +126,34 @@ bool HasUsableLevels(const std::string& fileName)
 {
     auto* const poManager = krv::datasources::DatasetManager::GetInstance();
     return std::unique_ptr<krv::datasources::IDataset>(poManager->OpenFormat("GDBALL", fileName, eReadOnly)) != nullptr;
+}
+
+// A zone would be taken for validity by others.
+[[noreturn]] void RefuseZone(const std::string& fileName)
+{
+    throw DataException(fileName + ": a zone cannot be kept beside the file: a bitmap without a description, the "
+                                   "validity mask, can");
+}
+
+// All of its pixels valid.
+void FillChannel(IRasterDataset& oMasks, unsigned int nChannel)
+{
+    const std::unique_ptr<krv::datasources::IRasterIO> poIO(oMasks.GetRasterIO({nChannel}));
+    const unsigned int nStep = std::min(poIO->GetTileHeight(), poIO->GetFileHeight());
+    std::vector<unsigned char> oRows(std::size_t{poIO->GetFileWidth()} * nStep, 255);
+    for (unsigned int nY = 0; nY < poIO->GetFileHeight(); nY += std::min(nStep, poIO->GetFileHeight() - nY))
+        poIO->WriteWindow(0u, nY, poIO->GetFileWidth(), std::min(nStep, poIO->GetFileHeight() - nY), oRows.data());
+}
+
+// Whether the generic format has the file open for update, and so its levels, which it marks itself.
+bool IsWatched(const std::string& fileName)
+{
+    const auto IsGeneric = [](std::FILE* pFile, void*)
+    {
+        return fpTestFlag(pFile, eGenericFile) != 0;
+    };
+    std::FILE* pFile = nullptr;
+    return fpCompare(fileName, "r+", &pFile, IsGeneric, nullptr);
 }
 
 void AddMissing(const MetadataMap& oFrom, MetadataMap& oTo, bool bNoData)
@@ -293,44 +323,59 @@ std::string Sidecars::FindMasks()
         const std::string text = oTags.GetFileMetadataValue(MASK_FLAGS + std::to_string(nMask));
         return krv::ParseNumber<unsigned int>(text).value_or(0);
     };
-    mbByChannel = nMasks > 1 && (GetFlags(1) & FLAG_OF_IMAGE) == 0;
-    for (unsigned int nMask = 1; nMask <= (mbByChannel ? nMasks : 1); ++nMask)
+    const bool bByChannel = nMasks > 1 && (GetFlags(1) & FLAG_OF_IMAGE) == 0;
+    for (unsigned int nMask = 1; nMask <= (bByChannel ? nMasks : 1); ++nMask)
         if ((GetFlags(nMask) & FLAG_ALL_VALID) == 0)
-            moMasks.push_back(nMask);
+            moMasks.push_back({nMask, bByChannel ? nMask : 0});
     return {};
 }
 
 std::vector<unsigned int> Sidecars::ListMasks()
 {
     LoadMasks();
-    return moMasks;
+    std::vector<unsigned int> oNumbers;
+    for (const Mask& oMask : moMasks)
+        oNumbers.push_back(oMask.mnNumber);
+    return oNumbers;
 }
 
 bool Sidecars::HasMask(unsigned int nMask)
 {
     LoadMasks();
-    return std::find(moMasks.begin(), moMasks.end(), nMask) != moMasks.end();
+    return std::any_of(moMasks.begin(), moMasks.end(), [nMask](const Mask& oMask) { return oMask.mnNumber == nMask; });
+}
+
+unsigned int Sidecars::FindMaskChannel(unsigned int nMask) const
+{
+    return std::find_if(moMasks.begin(), moMasks.end(), [nMask](const Mask& oMask) { return oMask.mnNumber == nMask; })
+        ->mnChannel;
 }
 
 std::string Sidecars::DescribeMask(unsigned int nMask)
 {
-    if (HasMask(nMask) && mbByChannel)
-        return "Validity of channel " + std::to_string(nMask);
-    return mbZone ? "Bitmap 1" : "";
+    if (IsZone(nMask))
+        return "Bitmap " + std::to_string(nMask);
+    const unsigned int nChannel = HasMask(nMask) ? FindMaskChannel(nMask) : 0;
+    return nChannel == 0 ? "" : "Validity of channel " + std::to_string(nChannel);
 }
 
 MetadataMap Sidecars::GetMaskTags(unsigned int nMask)
 {
-    if (!HasMask(nMask) || !mbByChannel)
+    const unsigned int nChannel = HasMask(nMask) ? FindMaskChannel(nMask) : 0;
+    if (nChannel == 0)
         return {};
-    return {{krv::datasources::VALIDITY_OF_CHANNEL, std::to_string(nMask)}};
+    return {{krv::datasources::VALIDITY_OF_CHANNEL, std::to_string(nChannel)}};
 }
 
 krv::datasources::IRasterIO* Sidecars::OpenMask(unsigned int nMask, bool bWrite)
 {
     if (!HasMask(nMask))
         throw DataException(moFileName + ": no mask " + std::to_string(nMask) + " lies beside it");
-    if (bWrite && !mbMaskWritten)
+    if (IsZone(nMask) && IsByChannel())
+        RefuseZone(moFileName);
+    if (mbMaskMade)
+        MakeMaskFile();
+    else if (bWrite && !mbMaskWritten)
     {
         mpoMask.reset();
         mpoMask = OpenForUpdate(*moMaskName);
@@ -340,28 +385,83 @@ krv::datasources::IRasterIO* Sidecars::OpenMask(unsigned int nMask, bool bWrite)
     {
         mbMaskChanged = true;
     };
+    const unsigned int nChannel = std::max(1u, FindMaskChannel(nMask));
     return new MaskIO(
-        std::unique_ptr<krv::datasources::IRasterIO>(dynamic_cast<IRasterDataset&>(*mpoMask).GetRasterIO({nMask})),
+        std::unique_ptr<krv::datasources::IRasterIO>(dynamic_cast<IRasterDataset&>(*mpoMask).GetRasterIO({nChannel})),
         Change);
 }
 
-void Sidecars::MakeMask()
+unsigned int Sidecars::MakeMask()
 {
-    if (!ListMasks().empty())
-        throw DataException(moFileName + ": a mask lies beside it already");
+    LoadMasks();
+    if (!moMasks.empty() && (moZone || !mbMaskMade || !IsByChannel()))
+        throw DataException(moFileName +
+                            ": validity masks lie beside the file already, and there is no place for other bitmaps");
+    // Numbers of channels are those of their masks, once the file is read again.
+    const unsigned int nMask = moMasks.empty() ? 1 : std::max(mnChannels, moMasks.back().mnNumber) + 1;
+    moMasks.push_back({nMask, 0});
+    moZone = nMask;
+    mbMaskMade = mbMaskWritten = mbMaskChanged = true;
+    return nMask;
+}
+
+void Sidecars::DeclareMask(unsigned int nChannel)
+{
+    const unsigned int nOwner = mnChannels == 1 && nChannel == 1 ? 0 : nChannel;
+    const bool bTaken = std::any_of(moMasks.begin(), moMasks.end(),
+                                    [nOwner](const Mask& oMask)
+                                    { return oMask.mnChannel != 0 && (nOwner == 0 || oMask.mnChannel == nOwner); });
+    const bool bLaidOut = mpoMask != nullptr && moMasks.size() == 1; // as the one of the image
+    if (!moZone || nOwner > mnChannels || bTaken || (nOwner != 0 && bLaidOut))
+        throw DataException(moFileName + ": a mask of " +
+                            (nChannel == 0 ? "the image" : "channel " + std::to_string(nChannel)) +
+                            " has no place beside the file");
+    moMasks.back().mnChannel = nOwner;
+    moZone.reset();
+}
+
+void Sidecars::MakeMaskFile()
+{
+    if (mpoMask)
+        return;
     const std::string name = moFileName + MASK_ENDING;
-    mpoMask.reset(krv::datasources::DatasetManager::GetInstance()->NewDataset(name, "TIF", "COMPRESS=DEFLATE"));
+    mpoMask.reset(
+        krv::datasources::DatasetManager::GetInstance()->NewDataset(name, "TIF", "COMPRESS=DEFLATE INTERLEAVE=BAND"));
     auto* const poRaster = dynamic_cast<IRasterDataset*>(mpoMask.get());
     if (poRaster == nullptr)
         throw DataException(name + ": a mask cannot be made");
-    poRaster->Create(mnWidth, mnHeight, {krv::gobs::DataType(krv::gobs::eDT_8U)});
-    AuxiliaryData oTags(1);
-    oTags.SetFileMetadataValue(MASK_FLAGS + std::string("1"), std::to_string(FLAG_OF_IMAGE));
-    mpoMask->WriteAuxiliaryData(oTags);
+    poRaster->Create(
+        mnWidth, mnHeight,
+        std::vector<krv::gobs::DataType>(IsByChannel() ? mnChannels : 1, krv::gobs::DataType(krv::gobs::eDT_8U)));
     moMaskName = name;
-    moMasks = {1};
-    mbByChannel = false;
-    mbMaskWritten = mbMaskChanged = mbZone = true;
+}
+
+// Says which masks there are; channels without one are valid, whoever reads the file.
+void Sidecars::CompleteMaskFile()
+{
+    MakeMaskFile();
+    const unsigned int nMasks = IsByChannel() ? mnChannels : 1;
+    AuxiliaryData oTags(nMasks);
+    for (unsigned int nMask = 1; nMask <= nMasks; ++nMask)
+    {
+        const bool bOwn =
+            !IsByChannel() || std::any_of(moMasks.begin(), moMasks.end(),
+                                          [nMask](const Mask& oMask) { return oMask.mnChannel == nMask; });
+        const unsigned int nFlags = !IsByChannel() ? FLAG_OF_IMAGE : bOwn ? 0 : FLAG_ALL_VALID;
+        oTags.SetFileMetadataValue(MASK_FLAGS + std::to_string(nMask), std::to_string(nFlags));
+        if (!bOwn)
+            FillChannel(dynamic_cast<IRasterDataset&>(*mpoMask), nMask);
+    }
+    mpoMask->WriteAuxiliaryData(oTags);
+    mbMaskMade = false;
+}
+
+void Sidecars::DropZone()
+{
+    if (moMasks.size() == 1)
+        return DropMasks();
+    moMasks.pop_back();
+    moZone.reset();
 }
 
 // One that was just made goes without a trace.
@@ -369,11 +469,13 @@ void Sidecars::DropMasks()
 {
     if (ListMasks().empty())
         return;
-    mpoMask->Delete();
+    if (mpoMask)
+        mpoMask->Delete();
     mpoMask.reset();
     moMaskName.emplace();
     moMasks.clear();
-    mbMaskWritten = mbMaskChanged = mbZone = false;
+    moZone.reset();
+    mbMaskMade = mbMaskWritten = mbMaskChanged = false;
 }
 
 std::vector<unsigned int> Sidecars::ListModels() const
@@ -410,8 +512,33 @@ void Sidecars::SetAuxXml(AuxXml oAuxXml)
     mbForgotten = false;
 }
 
+// Before the first pixel is in the file, and so not when the file is stored: a program that is killed in between leaves
+// no levels that pass for those of what it wrote.
+void Sidecars::ForgetLevelsBeside()
+{
+    if (mbLevelsForgotten)
+        return;
+    mbLevelsForgotten = true;
+    const std::string levels = mbNone ? std::string() : FindAppended(moFileName, LEVELS_ENDING);
+    if (levels.empty() || IsWatched(moFileName) || !HasUsableLevels(moFileName))
+        return;
+    try
+    {
+        const std::unique_ptr<krv::datasources::IDataset> poLevels(
+            krv::datasources::DatasetManager::GetInstance()->Open(levels, eUpdate));
+        ForgetLevels(*poLevels);
+        poLevels->Close();
+    }
+    catch (const Exception& oError)
+    {
+        krv::nspio::Warning::Warn(levels + " is outdated, and cannot be marked so: " + oError.GetMessage() +
+                                  "; remove it");
+    }
+}
+
 void Sidecars::ForgetPixels()
 {
+    ForgetLevelsBeside();
     if (mbForgotten)
         return;
     AuxXml oAuxXml = LoadAuxXml();
@@ -423,10 +550,8 @@ void Sidecars::ForgetPixels()
 
 void Sidecars::CheckStore() const
 {
-    if (mbZone)
-        throw DataException(moFileName +
-                            ": a zone cannot be kept beside the file: a bitmap without a description, the validity "
-                            "mask, can");
+    if (moZone)
+        RefuseZone(moFileName);
 }
 
 bool Sidecars::HoldsChanges() const
@@ -437,6 +562,9 @@ bool Sidecars::HoldsChanges() const
 void Sidecars::Store()
 {
     CheckStore();
+    mbLevelsForgotten = false;
+    if (mbMaskMade)
+        CompleteMaskFile();
     if (mbMaskChanged)
         mpoMask->Synchronize();
     mbMaskChanged = false;

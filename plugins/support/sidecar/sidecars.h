@@ -52,11 +52,15 @@ public:
     krv::datasources::MetadataMap GetMaskTags(unsigned int nMask);
     // Its pixels as those of a bitmap: 1 is valid. They are the caller's and go before this object.
     krv::datasources::IRasterIO* OpenMask(unsigned int nMask, bool bWrite);
-    // A mask of the image of no valid pixel, which is there for others after Store. It is a zone, which cannot be
-    // stored, until DeclareMask.
-    void MakeMask();
-    void DeclareMask() { mbZone = false; }
-    bool IsZone() const { return mbZone; }
+    // A mask of no valid pixel, which is there for others after Store; returns its number. It is a zone, which cannot
+    // be stored, until it is declared the image's, or that of a channel before somebody opens it. Channels without a
+    // mask of their own are then valid everywhere. Throws DataException where masks lie that were stored before.
+    unsigned int MakeMask();
+    bool IsZone(unsigned int nMask) const { return moZone == nMask; }
+    // nChannel: 0 for the image's. Throws DataException when there is no place for it beside the others.
+    void DeclareMask(unsigned int nChannel);
+    // The one that is not declared.
+    void DropZone();
     // All of them.
     void DropMasks();
 
@@ -69,8 +73,8 @@ public:
     // says nothing. Setting throws DataException where there is a file that cannot be used, which would be lost.
     const AuxXml& GetAuxXml() { return LoadAuxXml(); }
     void SetAuxXml(AuxXml oAuxXml);
-    // Before pixels change: what ".aux.xml" says of their values goes, and it is still of this file afterwards. Costs
-    // nothing the second time.
+    // Before pixels change: what ".aux.xml" says of their values goes, and it is still of this file afterwards; levels
+    // are marked as outdated at once. Costs nothing the second time.
     void ForgetPixels();
 
     // Throws DataException for what Store cannot keep.
@@ -93,7 +97,13 @@ public:
 private:
     const AuxXml& LoadAuxXml();
     void StoreAuxXml();
+    void ForgetLevelsBeside();
     void LoadMasks();
+    void MakeMaskFile();
+    void CompleteMaskFile();
+    // Of one that is there.
+    unsigned int FindMaskChannel(unsigned int nMask) const;
+    bool IsByChannel() const { return !moMasks.empty() && moMasks.front().mnChannel != 0; }
     // Why the file that is open is no mask of the image; empty when it is one, whose masks are then known.
     std::string FindMasks();
     bool IsOlder(const std::string& sidecar) const;
@@ -110,13 +120,19 @@ private:
     bool mbAuxXmlChanged = false;
     std::optional<std::string> moMaskName; // as found, once it was looked for
     std::unique_ptr<krv::datasources::IDataset> mpoMask;
-    std::vector<unsigned int> moMasks; // their numbers
-    bool mbByChannel = false;
+    struct Mask
+    {
+        unsigned int mnNumber;
+        unsigned int mnChannel; // 0 for the image's, and for a zone
+    };
+    std::vector<Mask> moMasks;
+    std::optional<unsigned int> moZone; // the number of the one that is not declared
+    bool mbMaskMade = false;            // here, and not stored yet
     bool mbMaskWritten = false;
     bool mbMaskChanged = false;
-    bool mbZone = false;
     std::optional<krv::mathmodel::RpcCoefficients> moModel; // to be written
     bool mbForgotten = false;
+    bool mbLevelsForgotten = false;
     std::map<std::string, std::string> moTroubles; // by sidecar
 };
 

@@ -199,6 +199,92 @@ TEST(Sidecars, MasksAreOfTheImagesSize)
     EXPECT_TRUE(std::filesystem::exists(file + ".msk.hdr") || IsRefused()) << "itself, which names no header there";
 }
 
+// Of channels: the others are valid, whoever reads the file.
+TEST(Sidecars, MasksOfChannelsAreWritten)
+{
+    const TempFolder oFolder;
+    const std::string file = oFolder.File("x.img");
+    const auto SetPixel = [](IBitmapDataset& oBitmaps, unsigned int nMask, unsigned int nX)
+    {
+        unsigned char nBit = 1;
+        std::unique_ptr<IRasterIO>(oBitmaps.GetBitmapIO({nMask}))->WriteWindow(nX, 0u, 1u, 1u, &nBit);
+    };
+    {
+        const std::unique_ptr<IDataset> poNew(DatasetManager::GetInstance()->NewDataset(file, "RAW", ""));
+        Rasters(*poNew).Create(4, 1, {krv::gobs::eDT_16U, krv::gobs::eDT_16U, krv::gobs::eDT_16U});
+        auto& oBitmaps = dynamic_cast<IBitmapDataset&>(*poNew);
+        for (const unsigned int nChannel : {3u, 1u})
+        {
+            const unsigned int nMask = oBitmaps.CreateBitmap();
+            oBitmaps.SetBitmapMetadata(nMask, {{VALIDITY_OF_CHANNEL, std::to_string(nChannel)}});
+            SetPixel(oBitmaps, nMask, nChannel);
+        }
+        const unsigned int nZone = oBitmaps.CreateBitmap();
+        EXPECT_THROW(SetPixel(oBitmaps, nZone, 0), krv::DataException) << "it is a zone still";
+        EXPECT_THROW(oBitmaps.SetBitmapMetadata(nZone, {{"of", "clouds"}}), krv::DataException);
+        poNew->Close();
+    }
+    const auto poDataset = Open(file);
+    auto& oBitmaps = dynamic_cast<IBitmapDataset&>(*poDataset);
+    EXPECT_EQ(oBitmaps.GetBitmapList(), (std::vector<unsigned int>{1, 3}));
+    EXPECT_EQ(oBitmaps.GetBitmapMetadata(3), (MetadataMap{{VALIDITY_OF_CHANNEL, "3"}}));
+    EXPECT_EQ(ReadMask(*poDataset, 1), std::string("\0\1\0\0", 4));
+    EXPECT_EQ(ReadMask(*poDataset, 3), std::string("\0\0\0\1", 4));
+    const auto poMask = Open(file + ".msk");
+    EXPECT_EQ(krv::test::ReadPixels(BasicReader(poMask.get(), std::vector<unsigned int>{2}, false)),
+              "\xff\xff\xff\xff");
+    EXPECT_EQ(poMask->ReadAuxiliaryData().GetFileMetadataValue("INTERNAL_MASK_FLAGS_2"), "1");
+}
+
+// Pixels that are written make the levels of the file beside outdated, whichever way the image was opened; the file of
+// another scene is left alone.
+TEST(Sidecars, LevelsBesideAreOutdatedByNewPixels)
+{
+    for (const auto& [pFormat, bGeneric] : {std::pair{"TIF", false}, {"TIF", true}, {"RAW", false}, {"RAW", true}})
+    {
+        SCOPED_TRACE(testing::Message() << pFormat << bGeneric);
+        const TempFolder oFolder;
+        const std::string file = Make(oFolder, "x.img", pFormat, 100, 80), levels = file + ".ovr";
+        const auto WritePixel = [&, bGeneric = bGeneric](bool bClose)
+        {
+            const std::unique_ptr<IDataset> poDataset(
+                bGeneric ? DatasetManager::GetInstance()->OpenFormat("GDBALL", file, eUpdate)
+                         : Open(file, eUpdate).release());
+            unsigned char nPixel = 77;
+            std::unique_ptr<IRasterIO>(Rasters(*poDataset).GetRasterIO({1}))->WriteWindow(0u, 0u, 1u, 1u, &nPixel);
+            if (bClose)
+                poDataset->Close();
+        };
+        Make(oFolder, "x.img.ovr", "TIF", 50, 40);
+        {
+            const auto poLevels = Open(levels, eUpdate);
+            BasicWriter oWriter(&Rasters(*poLevels), {1});
+            EXPECT_TRUE(BuildOverviews(oWriter, {2}, "average"));
+            poLevels->Close();
+        }
+        const auto CountValid = [&]
+        {
+            const auto poImage = Open(file);
+            const BasicOverviewReaderAccessor oAccessor(&Rasters(*poImage), {1});
+            EXPECT_EQ(oAccessor.GetLevels(), (std::vector<unsigned int>{2, 4}));
+            return int{oAccessor.IsLevelValid(2)} + int{oAccessor.IsLevelValid(4)};
+        };
+        EXPECT_EQ(CountValid(), 2);
+        {
+            const krv::test::OutputCapture oCapture; // of what is lost
+            WritePixel(false);
+        }
+        EXPECT_EQ(CountValid(), 0) << "before the pixels are stored";
+        WritePixel(true);
+        EXPECT_EQ(CountValid(), 0);
+        Make(oFolder, "x.img.ovr", "TIF", 70, 70);
+        const std::string other = ReadFile(levels);
+        const krv::test::OutputCapture oCapture;
+        WritePixel(true);
+        EXPECT_TRUE(ReadFile(levels) == other);
+    }
+}
+
 TEST(Generic, LevelsLieBesideWhatCannotHoldThem)
 {
     for (const char* pFormat : {"RAW", "DEMO"})

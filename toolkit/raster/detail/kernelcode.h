@@ -419,6 +419,41 @@ constexpr std::size_t VECTOR_BYTES = 16;
 constexpr std::size_t LOAD_BYTES = 16;
 #endif
 
+inline std::uint16_t TurnRound(std::uint16_t nWord)
+{
+    return __builtin_bswap16(nWord);
+}
+inline std::uint32_t TurnRound(std::uint32_t nWord)
+{
+    return __builtin_bswap32(nWord);
+}
+inline std::uint64_t TurnRound(std::uint64_t nWord)
+{
+    return __builtin_bswap64(nWord);
+}
+
+template <typename TWord, std::size_t NCount>
+inline void SwapSome(const unsigned char* pSource, unsigned char* pTarget)
+{
+    TWord aWords[NCount];
+    std::memcpy(aWords, pSource, sizeof(aWords));
+    for (TWord& nWord : aWords)
+        nWord = TurnRound(nWord);
+    std::memcpy(pTarget, aWords, sizeof(aWords));
+}
+
+// In pieces that are loaded whole before they are stored: so the compiler makes vectors of them, in place too.
+template <typename TWord>
+void SwapWords(const unsigned char* pSource, unsigned char* pTarget, std::size_t nCount)
+{
+    constexpr std::size_t PIECE = 128 / sizeof(TWord);
+    std::size_t i = 0;
+    for (; i + PIECE <= nCount; i += PIECE)
+        SwapSome<TWord, PIECE>(pSource + i * sizeof(TWord), pTarget + i * sizeof(TWord));
+    for (; i < nCount; ++i)
+        SwapSome<TWord, 1>(pSource + i * sizeof(TWord), pTarget + i * sizeof(TWord));
+}
+
 template <std::size_t NSource, std::size_t NTarget>
 constexpr MergeLoop FindMerge()
 {
@@ -438,7 +473,8 @@ constexpr Kernels MakeKernels(std::index_sequence<N...>)
             {CountChanges<N / PART_COUNT, N % PART_COUNT>...},
             {FindMerge<N / PART_COUNT, N % PART_COUNT>()...},
             VECTOR_BYTES,
-            LOAD_BYTES};
+            LOAD_BYTES,
+            {SwapWords<std::uint16_t>, SwapWords<std::uint32_t>, SwapWords<std::uint64_t>}};
 }
 
 constexpr Kernels KERNELS = MakeKernels(std::make_index_sequence<PART_COUNT * PART_COUNT>());

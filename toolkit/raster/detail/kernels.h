@@ -35,6 +35,9 @@ struct MergeTerm
 using MergeLoop = void (*)(const MergeTerm* pTerms, std::size_t nTerms, unsigned char* pTarget,
                            std::size_t nPeriodBytes, std::size_t nPeriods);
 
+// Packed values of a number of bytes in the other byte order, in place or to elsewhere.
+using Swapper = void (*)(const unsigned char* pSource, unsigned char* pTarget, std::size_t nCount);
+
 // The inner loops, compiled for one instruction set.
 struct Kernels
 {
@@ -43,9 +46,10 @@ struct Kernels
 
     Pairs<Converter> moConverters;
     Pairs<ChangeCounter> moCounters;
-    Pairs<MergeLoop> moMerges;     // null where values take a conversion of their own; without vectors everywhere
-    std::size_t mnVectorBytes = 0; // of a merged vector
-    std::size_t mnLoadBytes = 0;   // of the load of a term
+    Pairs<MergeLoop> moMerges;         // null where values take a conversion of their own; without vectors everywhere
+    std::size_t mnVectorBytes = 0;     // of a merged vector
+    std::size_t mnLoadBytes = 0;       // of the load of a term
+    std::array<Swapper, 3> moSwappers; // of 2, 4 and 8 bytes
 
     Converter GetConverter(std::size_t nSource, std::size_t nTarget) const
     {
