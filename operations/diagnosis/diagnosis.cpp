@@ -31,6 +31,7 @@
 
 #include <algorithm>
 #include <array>
+#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <functional>
@@ -381,6 +382,7 @@ void AskPlugin(const std::string& file, const LoadedPlugin& oPlugin, const Heade
 
 std::string DescribeUnknown(const std::string& file)
 {
+    constexpr std::string_view ENVI = "ENVI";
     Header oHeader{};
     const std::string kind = GuessFileKind(oHeader.data(), ReadHeader(file, oHeader));
     if (!kind.empty())
@@ -394,6 +396,13 @@ std::string DescribeUnknown(const std::string& file)
                 "the header {} beside it is of a kind that is not read: write an ENVI header {}.hdr with "
                 "its size and data type",
                 header, file);
+    }
+    for (const std::string& header : {file + ".hdr", stem + ".hdr"})
+    {
+        std::error_code oNone;
+        const std::size_t nBytes = std::filesystem::is_regular_file(header, oNone) ? ReadHeader(header, oHeader) : 0;
+        if (nBytes >= ENVI.size() && std::memcmp(oHeader.data(), ENVI.data(), ENVI.size()) == 0)
+            return fmt::format("the ENVI header {} beside it tells of a file of another size, or is no text", header);
     }
     return {};
 }

@@ -65,8 +65,15 @@ HeaderText::HeaderText(std::string_view text)
         oEntry.moLines = before.substr(0, before.size() - text.size());
         if (!oEntry.moKey.empty())
             oEntry.moValue = Trim(std::string_view(oEntry.moLines).substr(nSign + 1));
-        moEntries.push_back(std::move(oEntry));
+        Add(std::move(oEntry));
     }
+}
+
+void HeaderText::Add(Entry oEntry)
+{
+    if (!oEntry.moKey.empty())
+        moPlaces[Normalise(oEntry.moKey)].push_back(moEntries.size());
+    moEntries.push_back(std::move(oEntry));
 }
 
 std::string HeaderText::Normalise(std::string_view key)
@@ -85,11 +92,17 @@ std::string HeaderText::Normalise(std::string_view key)
 
 std::optional<std::string> HeaderText::Find(std::string_view key) const
 {
-    const std::string normal = Normalise(key);
-    const auto oFound = std::find_if(moEntries.rbegin(), moEntries.rend(),
-                                     [&normal](const Entry& oEntry)
-                                     { return !oEntry.moKey.empty() && Normalise(oEntry.moKey) == normal; });
-    return oFound == moEntries.rend() ? std::nullopt : std::optional(oFound->moValue);
+    const auto oFound = moPlaces.find(Normalise(key));
+    return oFound == moPlaces.end() ? std::nullopt : std::optional(moEntries[oFound->second.back()].moValue);
+}
+
+bool HeaderText::IsContradicted(std::string_view key) const
+{
+    const auto oFound = moPlaces.find(Normalise(key));
+    return oFound != moPlaces.end() &&
+           std::any_of(oFound->second.begin(), oFound->second.end(),
+                       [&](std::size_t nPlace)
+                       { return moEntries[nPlace].moValue != moEntries[oFound->second.back()].moValue; });
 }
 
 std::string HeaderText::GetText(std::string_view key) const
@@ -125,22 +138,17 @@ std::vector<std::string> HeaderText::GetKeys() const
 
 void HeaderText::Set(const std::string& key, const std::string& value)
 {
-    const std::string normal = Normalise(key);
-    const auto oFound = std::find_if(moEntries.begin(), moEntries.end(),
-                                     [&normal](const Entry& oEntry)
-                                     { return !oEntry.moKey.empty() && Normalise(oEntry.moKey) == normal; });
-    const std::string written = oFound == moEntries.end() ? key : oFound->moKey;
-    const auto oValue = Find(key);
-    if (oValue && *oValue == value)
+    const auto oFound = moPlaces.find(Normalise(key));
+    if (oFound == moPlaces.end())
+        return Add({key, value, key + " = " + value + "\n"});
+    std::vector<std::size_t>& oPlaces = oFound->second;
+    if (moEntries[oPlaces.back()].moValue == value)
         return;
-    Entry oNew{written, value, written + " = " + value + "\n"};
-    if (oFound == moEntries.end())
-        return moEntries.push_back(std::move(oNew));
-    *oFound = std::move(oNew);
-    moEntries.erase(std::remove_if(oFound + 1, moEntries.end(),
-                                   [&normal](const Entry& oEntry)
-                                   { return !oEntry.moKey.empty() && Normalise(oEntry.moKey) == normal; }),
-                    moEntries.end());
+    const std::string written = moEntries[oPlaces.front()].moKey;
+    for (const std::size_t nPlace : oPlaces)
+        moEntries[nPlace] = {};
+    oPlaces.resize(1);
+    moEntries[oPlaces.front()] = {written, value, written + " = " + value + "\n"};
 }
 
 void HeaderText::SetList(const std::string& key, const std::vector<std::string>& oParts)
@@ -155,9 +163,12 @@ void HeaderText::SetList(const std::string& key, const std::vector<std::string>&
 
 void HeaderText::Remove(std::string_view key)
 {
-    const std::string normal = Normalise(key);
-    std::erase_if(moEntries, [&normal](const Entry& oEntry)
-                  { return !oEntry.moKey.empty() && Normalise(oEntry.moKey) == normal; });
+    const auto oFound = moPlaces.find(Normalise(key));
+    if (oFound == moPlaces.end())
+        return;
+    for (const std::size_t nPlace : oFound->second)
+        moEntries[nPlace] = {};
+    moPlaces.erase(oFound);
 }
 
 bool HeaderText::CanHold(const std::string& key, const std::string& value)

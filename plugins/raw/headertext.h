@@ -1,5 +1,6 @@
 #pragma once
 
+#include <map>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -31,6 +32,8 @@ public:
     std::vector<std::string> GetList(std::string_view key) const;
     // All keys in their order, as they are written.
     std::vector<std::string> GetKeys() const;
+    // Whether a key is there more than once, with different values.
+    bool IsContradicted(std::string_view key) const;
 
     // In the place of what the key had, or at the end. The value with its braces.
     void Set(const std::string& key, const std::string& value);
@@ -51,10 +54,13 @@ private:
     {
         std::string moKey; // empty for a comment or a line without sense
         std::string moValue;
-        std::string moLines; // all of it, with the end of the last line
+        std::string moLines; // all of it, with the end of the last line; empty for one that was removed
     };
 
+    void Add(Entry oEntry);
+
     std::vector<Entry> moEntries;
+    std::map<std::string, std::vector<std::size_t>> moPlaces; // of each key as they are compared, ascending
 };
 
 } // namespace krv::plugins::raw

@@ -24,6 +24,9 @@ constexpr std::pair<int, krv::gobs::NativeDataTypeCode> TYPES[] = {
 constexpr std::pair<const char*, Interleave> INTERLEAVES[] = {
     {"bsq", Interleave::eBand}, {"bil", Interleave::eLine}, {"bip", Interleave::ePixel}};
 
+constexpr const char* FORM_KEYS[] = {"samples",   "lines",      "bands",     "header offset",
+                                     "data type", "interleave", "byte order"};
+
 [[noreturn]] void Refuse(const std::string& name, const std::string& key, const std::string& value,
                          const std::string& takes)
 {
@@ -81,6 +84,9 @@ std::optional<double> ParseReal(const std::string& text)
 RawForm ReadForm(const HeaderText& oHeader, const std::string& name)
 {
     CheckPresent(oHeader, name);
+    for (const char* const pKey : FORM_KEYS)
+        if (oHeader.IsContradicted(pKey))
+            throw FileFormatException(name, name + ": \"" + pKey + "\" stands there twice, with different values");
     RawForm oForm;
     oForm.mnWidth = static_cast<unsigned int>(ReadNumber(oHeader, name, "samples", 0, 1, INT_MAX));
     oForm.mnHeight = static_cast<unsigned int>(ReadNumber(oHeader, name, "lines", 0, 1, INT_MAX));

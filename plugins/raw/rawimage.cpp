@@ -183,7 +183,8 @@ RawImage ReadTile(RawFiles oFiles)
     return oImage;
 }
 
-// Keywords in capitals, with what stands behind them.
+// Keywords in capitals, with what stands behind them; two values of the same are joined by a blank, which no value of
+// its own has.
 std::map<std::string, std::string> ParseKeywords(std::string_view text)
 {
     std::map<std::string, std::string> oKeywords;
@@ -193,7 +194,8 @@ std::map<std::string, std::string> ParseKeywords(std::string_view text)
         std::istringstream oWords(line);
         std::string key, value;
         if (oWords >> key >> value)
-            oKeywords[krv::ToUpper(key)] = value;
+            if (std::string& known = oKeywords[krv::ToUpper(key)]; known != value)
+                known += (known.empty() ? "" : " ") + value;
     }
     return oKeywords;
 }
@@ -365,8 +367,12 @@ RawImage ReadEnvi(RawFiles oFiles)
 bool IsEsriHeader(std::string_view text)
 {
     const auto oKeywords = ParseKeywords(text);
-    return oKeywords.contains("NROWS") && oKeywords.contains("NCOLS") && IsNumber(oKeywords.at("NROWS")) &&
-           IsNumber(oKeywords.at("NCOLS"));
+    const auto IsThere = [&oKeywords](const char* pKey)
+    {
+        const auto oFound = oKeywords.find(pKey);
+        return oFound != oKeywords.end() && IsNumber(oFound->second.substr(0, oFound->second.find(' ')));
+    };
+    return IsThere("NROWS") && IsThere("NCOLS");
 }
 
 std::optional<RawFiles> FindFiles(const std::string& fileName)

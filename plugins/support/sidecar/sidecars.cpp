@@ -198,7 +198,7 @@ const AuxXml& Sidecars::LoadAuxXml()
         return *moAuxXml;
     try
     {
-        moAuxXml.emplace(ReadSidecar(moAuxXmlName, MOST_XML_BYTES), moAuxXmlName, mnChannels);
+        moAuxXml = AuxXml(ReadSidecar(moAuxXmlName, MOST_XML_BYTES), moAuxXmlName, mnChannels);
     }
     catch (const Exception& oError)
     {

@@ -21,6 +21,7 @@
 #include <filesystem>
 #include <memory>
 #include <random>
+#include <sstream>
 
 using namespace krv::datasources;
 using krv::conformance::ReadFile;
@@ -31,6 +32,17 @@ namespace
 {
 
 const std::string BASE = "ENVI\nsamples = 5\nlines = 4\nbands = 2\ndata type = 2\ninterleave = bsq\n";
+
+// The same with other lines in place of those of their keys.
+std::string With(const std::string& lines)
+{
+    std::string header = BASE;
+    std::istringstream oLines(lines);
+    for (std::string line; std::getline(oLines, line); header += line + "\n")
+        if (const std::size_t nAt = header.find("\n" + line.substr(0, line.find('=')) + "="); nAt != std::string::npos)
+            header.erase(nAt + 1, header.find('\n', nAt + 1) - nAt);
+    return header;
+}
 
 std::unique_ptr<IDataset> Open(const std::string& file, AccessMode eMode = eReadOnly)
 {
@@ -80,26 +92,52 @@ TEST(RawFormat, HeadersAreHostile)
         {BASE, 80 + 4097, "file: "},
         {"ENVI\r\n; all\r\nSAMPLES=5\r\n lines =4\r\nData  Type=2\r\n", 40, ""},
         {"ENVI\nsamples = 5\nlines = 4\n", 80, "file: FILE.hdr: the header has no \"data type\""},
-        {BASE + "samples = -5\n", 80, "file: FILE.hdr: \"samples = -5\" is not a number from 1 to 2147483647"},
-        {BASE + "lines = 0\n", 80, "file: FILE.hdr: \"lines = 0\" is not a number from 1 to 2147483647"},
-        {BASE + "lines = 4.0\n", 80, "file: FILE.hdr: \"lines = 4.0\" is not a number from 1 to 2147483647"},
-        {BASE + "bands = 100001\n", 80, "file: FILE.hdr: \"bands = 100001\" is not a number from 1 to 100000"},
-        {BASE + "header offset = 99999999999999999999\n", 80,
+        {With("samples = -5\n"), 80, "file: FILE.hdr: \"samples = -5\" is not a number from 1 to 2147483647"},
+        {With("lines = 0\n"), 80, "file: FILE.hdr: \"lines = 0\" is not a number from 1 to 2147483647"},
+        {With("lines = 4.0\n"), 80, "file: FILE.hdr: \"lines = 4.0\" is not a number from 1 to 2147483647"},
+        {With("bands = 100001\n"), 80, "file: FILE.hdr: \"bands = 100001\" is not a number from 1 to 100000"},
+        {With("header offset = 99999999999999999999\n"), 80,
          "file: FILE.hdr: \"header offset = 99999999999999999999\" is not a number from 0 to 9223372036854775807"},
-        {BASE + "header offset = 9223372036854775807\n", 80, "file: "},
-        {BASE + "data type = 7\n", 80,
+        {With("header offset = 9223372036854775807\n"), 80, "file: "},
+        {With("data type = 7\n"), 80,
          "file: FILE.hdr: \"data type = 7\" is not one of 1, 2, 3, 4, 5, 6, 9, 12, 13, 14, 15"},
-        {BASE + "interleave = bup\n", 80, "file: FILE.hdr: \"interleave = bup\" is not bsq, bil or bip"},
-        {BASE + "byte order = 2\n", 80, "file: FILE.hdr: \"byte order = 2\" is not a number from 0 to 1"},
+        {With("interleave = bup\n"), 80, "file: FILE.hdr: \"interleave = bup\" is not bsq, bil or bip"},
+        {With("byte order = 2\n"), 80, "file: FILE.hdr: \"byte order = 2\" is not a number from 0 to 1"},
         {BASE + "file compression = 1\n", 80,
          "file: FILE.hdr: \"file compression = 1\" is not 0: compressed files cannot be read"},
-        {BASE + "samples = 2147483647\nlines = 2147483647\ndata type = 9\n", 80, "file: "},
+        {With("samples = 2147483647\nlines = 2147483647\ndata type = 9\n"), 80, "file: "},
         {BASE + "band names = {a, b", 80, ""},
+        {BASE + "Samples=5\n", 80, ""},
+        {BASE + "Samples=4\n", 80, "file: FILE.hdr: \"samples\" stands there twice, with different values"},
         {"ENVIsamples = 5\n", 80, "file: "},
         {"nothing of this kind\n", 80, "file: "},
         {BASE + std::string(1, '\0'), 80, "file: "}};
     for (const auto& [header, nBytes, error] : HEADERS)
         EXPECT_EQ(OpenError(header, nBytes), error) << header;
+}
+
+// One that ends earlier than when it was opened is told of; pixels of a file that lost its name are still there.
+TEST(RawFormat, FilesMayShrinkAndVanish)
+{
+    const TempFolder oFolder;
+    oFolder.Write("x.hdr", BASE);
+    const std::string file = oFolder.Write("x.img", std::string(80, 'p'));
+    const auto poDataset = Open(file, eUpdate);
+    const auto Read = [&]
+    {
+        std::string pixels(80, '?');
+        const std::unique_ptr<IRasterIO> poIO(Rasters(*poDataset).GetRasterIO({2, 1}));
+        poIO->ReadWindow(0u, 0u, 5u, 4u, reinterpret_cast<unsigned char*>(pixels.data()));
+        return pixels;
+    };
+    std::filesystem::resize_file(file, 50);
+    EXPECT_NE(krv::test::Error(Read).find(file), std::string::npos);
+    std::filesystem::resize_file(file, 5000);
+    EXPECT_NE(Read().find('p'), std::string::npos);
+    std::filesystem::remove(file);
+    std::filesystem::remove(oFolder.File("x.hdr"));
+    EXPECT_NE(Read().find('p'), std::string::npos);
+    EXPECT_EQ(krv::test::Error([&] { poDataset->Close(); }), "");
 }
 
 // Whatever belongs to another is left to it, by its first bytes or by its size.

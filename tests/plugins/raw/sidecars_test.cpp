@@ -155,6 +155,7 @@ TEST(Sidecars, AddWhatTheFileLacks)
         EXPECT_TRUE(dynamic_cast<IGeocodedDataset&>(*poDamaged).GetGeocoding().IsIdentity());
         EXPECT_EQ(poDamaged->ReadCRS(), nullptr);
         EXPECT_EQ(poDamaged->ReadCRS(), nullptr);
+        EXPECT_EQ(poDamaged->ReadAuxiliaryData().GetChanMetadataValue("NO_DATA_VALUE", 1), "");
         EXPECT_EQ(oCapture.moWarnings.size(), 3u);
     }
 }
