@@ -156,7 +156,10 @@ std::shared_ptr<SharedImage> SharedImage::Find(const std::string& fileName, Acce
         return nullptr;
     const std::lock_guard oLock(GetRegister().moMutex);
     const auto oFound = GetRegister().moImages.find(pFile);
-    return oFound == GetRegister().moImages.end() ? nullptr : oFound->second.lock();
+    auto poImage = oFound == GetRegister().moImages.end() ? nullptr : oFound->second.lock();
+    if (poImage == nullptr) // the manager would ask here again, for ever
+        throw FileFormatException(fileName, fileName + ": stands in the table of open files, but is not open here");
+    return poImage;
 }
 
 void SharedImage::Enter(const std::shared_ptr<SharedImage>& poImage)

@@ -29,7 +29,8 @@ public:
     SharedImage(const SharedImage&) = delete;
     SharedImage& operator=(const SharedImage&) = delete;
 
-    // The one that stands in the table under a name and a mode; null when there is none.
+    // The one that stands in the table under a name and a mode; null when there is none. Throws FileFormatException for
+    // an entry that is somebody else's, or of one that goes this moment.
     static std::shared_ptr<SharedImage> Find(const std::string& fileName, AccessMode eMode);
     // Puts it there.
     static void Enter(const std::shared_ptr<SharedImage>& poImage);

@@ -18,6 +18,7 @@
 #include "tests/support/pixels.h"
 #include "tests/support/recipe.h"
 #include "tests/support/thrown.h"
+#include "toolkit/core/core.h"
 #include "toolkit/ogc/cs/crsfactory.h"
 #include "toolkit/ogc/cs/geocodinginfo.h"
 #include "toolkit/ogc/cs/icrs.h"
@@ -25,6 +26,7 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdio>
 #include <filesystem>
 #include <memory>
 
@@ -430,6 +432,12 @@ TEST(Generic, OpenFilesAreShared)
     poSecond->Close();
     EXPECT_EQ(krv::test::ReadPixels(BasicReader(file))[0], 78);
     EXPECT_EQ(krv::test::Error([&] { Open(file, eUpdate)->Close(); }), "") << "nobody has it open any more";
+    // An entry that somebody else made leads nowhere, and back to nobody.
+    std::FILE* const pFile = std::fopen(file.c_str(), "rb");
+    fpAdd(file, "r+", pFile, eGenericFile);
+    EXPECT_EQ(Open(file, eUpdate), nullptr);
+    fpRemove(pFile);
+    std::fclose(pFile);
 }
 
 TEST(Generic, TypesAreMadeByTheirFormats)
