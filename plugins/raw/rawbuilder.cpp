@@ -8,6 +8,7 @@
 #include <sys/stat.h>
 
 #include <memory>
+#include <utility>
 
 namespace krv::plugins::raw
 {
@@ -42,6 +43,9 @@ krv::datasources::IDataset* RawBuilder::Create(const std::string& fileName, cons
         if (krv::ToUpper(fileName).ends_with(pEnding))
             throw DataException(fileName + ": name the new data file otherwise: its header is made beside it");
     RawOptions oOptions;
+    for (const auto& [pEnding, eInterleave] : {std::pair{".BIL", Interleave::eLine}, {".BIP", Interleave::ePixel}})
+        if (krv::ToUpper(fileName).ends_with(pEnding))
+            oOptions.meInterleave = eInterleave; // as the name promises
     support::Options oKeys;
     oOptions.List(oKeys);
     oKeys.Parse(options);

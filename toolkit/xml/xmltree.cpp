@@ -194,10 +194,17 @@ private:
     std::size_t mnNodes = 0;
 };
 
+// Whether characters take two bytes, the upper one of most behind the lower.
+bool IsWide(std::string_view data)
+{
+    return data.starts_with("\xFF\xFE") || data.starts_with(std::string_view("<\0", 2));
+}
+
 std::string_view WithoutTerminator(std::string_view data)
 {
-    while (!data.empty() && data.back() == '\0')
-        data.remove_suffix(1);
+    const std::string_view end("\0\0", IsWide(data) ? 2 : 1);
+    while (data.ends_with(end) && (end.size() == 1 || data.size() % 2 == 0))
+        data.remove_suffix(end.size());
     return data;
 }
 

@@ -292,6 +292,9 @@ TEST(RawFormat, NewFilesDoNotTakeTheHeadersOfOthers)
     Make("x.img", 3);
     Make("x.dat", 4);
     Make("x.img", 5);
+    Make("n.bil", 6);
+    EXPECT_NE(ReadFile(oFolder.File("n.hdr")).find("interleave = bil\n"), std::string::npos);
+    EXPECT_EQ(Open(oFolder.File("n.bil"))->Delete(), eDone);
     EXPECT_EQ(Rasters(*Open(oFolder.File("x.img"))).GetWidth(), 5u);
     EXPECT_EQ(Rasters(*Open(oFolder.File("x.dat"))).GetWidth(), 4u);
     EXPECT_EQ(std::distance(std::filesystem::directory_iterator(oFolder.GetPath()), {}), 4);

@@ -127,6 +127,10 @@ TEST(AuxXmlFiles, AreMerged)
     EXPECT_TRUE(oSecond.GetStamp() == (AuxXml::Stamp{80, -1}));
     for (const char* pKept : {"<Unknown>kept</Unknown>", "<HistItem>", "band=\"9\"", "<Category>a, b"})
         EXPECT_NE(oSecond.Write().find(pKept), std::string::npos) << pKept;
+    std::string wide("\xFF\xFE", 2);
+    for (const char c : std::string("<PAMDataset><SRS>EPSG:4326</SRS></PAMDataset>"))
+        wide += {c, '\0'};
+    EXPECT_EQ(AuxXml(wide, "x", 1).GetCRS(), "EPSG:4326");
     for (const char* pBad : {"", "<Other/>", "<PAMDataset>", "Test file", "<!DOCTYPE a []><PAMDataset/>"})
         EXPECT_THROW(AuxXml(pBad, "x", 1), krv::DataException) << pBad;
 }
