@@ -2,7 +2,6 @@
 
 #include "datasources/interfaces/ichannelinfo.h"
 #include "datasources/interfaces/idataset.h"
-#include "datasources/interfaces/imathmodeldataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/droppedtags.h"
@@ -208,9 +207,7 @@ krv::gobs::DataType SourceFile::GetType(unsigned int nChannel) const
 
 bool SourceFile::IsIdentityPlace(bool bHasCrs) const
 {
-    const auto* const poModels = dynamic_cast<const krv::datasources::IMathModelDataset*>(&GetDataset());
-    return bHasCrs && (poModels == nullptr || !poModels->HasMathModel()) &&
-           moMetadata.GetFileMetadataValue("GroundControlPoints").empty() &&
+    return bHasCrs && moMetadata.GetFileMetadataValue("GroundControlPoints").empty() &&
            moMetadata.GetFileMetadataValue("map info").empty();
 }
 

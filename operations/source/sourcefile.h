@@ -101,8 +101,8 @@ public:
     unsigned int GetChannelCount() const;
     krv::gobs::DataType GetType(unsigned int nChannel) const;
     const krv::datasources::AuxiliaryData& GetMetadata() const { return moMetadata; }
-    // Whether a geocoding that is the identity is a place: only beside a reference system, and where no sensor model,
-    // ground control points or rotated "map info" say another.
+    // Whether a geocoding that is the identity is a place: only beside a reference system, and where neither ground
+    // control points nor a rotated "map info" say another.
     bool IsIdentityPlace(bool bHasCrs) const;
     // The channel's value of "NO_DATA_VALUE", else the file's, without white space around it; empty when there is none.
     std::string GetNoDataText(unsigned int nChannel) const;
