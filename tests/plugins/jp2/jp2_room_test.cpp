@@ -159,7 +159,7 @@ std::string ReadError(const std::string& file)
             poIO->ReadWindow(0, 0, std::min(64u, poIO->GetFileWidth()), std::min(64u, poIO->GetFileHeight()),
                              oPixels.data());
         }
-        std::unique_ptr<krv::ogc::cs::ICRS>(poDataset->ReadCRS());
+        const std::unique_ptr<krv::ogc::cs::ICRS> poCRS(poDataset->ReadCRS());
         poDataset->ReadAuxiliaryData();
         return {};
     }
