@@ -487,6 +487,11 @@ Gatherers MakeGatherers(const krv::gobs::DataType& oType, const std::vector<Gath
     return oGatherers;
 }
 
+// Small tiles are handed to a thread together: one alone takes hardly longer than that. Not many, since each may have
+// histograms.
+constexpr std::uint64_t PIECE_BYTES = std::uint64_t{1} << 20;
+constexpr std::uint64_t MOST_TOGETHER = 8;
+
 // Of one tile; oHow: one per channel.
 struct TileStatistics
 {
@@ -558,18 +563,28 @@ std::vector<ChannelStatistics> GatherTiles(FileWorkers<Worker>& oWorkers,
                              krv::gobs::BufferBytes(oReader.GetWidth(), oReader.GetHeight(), oReader.GetChansCount(),
                                                     oReader.GetDataType()));
     krv::threading::TaskGroup oThreads(poExecutor, [&oCounter] { oCounter.Repeat(); });
+    const std::uint64_t nTiles = oReader.GetTileCount();
+    const std::uint64_t nTileBytes = krv::gobs::BufferBytes(oReader.GetTileWidth(), oReader.GetTileHeight(),
+                                                            oReader.GetChansCount(), oReader.GetDataType());
+    const std::uint64_t nTogether = std::clamp<std::uint64_t>(PIECE_BYTES / nTileBytes, 1, MOST_TOGETHER);
     krv::threading::ForEachItem(
-        oThreads, oReader.GetTileCount(),
-        [&](std::uint64_t nTile)
+        oThreads, (nTiles + nTogether - 1) / nTogether,
+        [&](std::uint64_t nPiece)
         {
             const typename FileWorkers<Worker>::Use oWorker(oWorkers);
-            return Gather(*oWorker, nTile, oHow);
+            std::vector<TileStatistics> oPiece;
+            for (std::uint64_t n = nPiece * nTogether; n < std::min(nTiles, (nPiece + 1) * nTogether); ++n)
+                oPiece.push_back(Gather(*oWorker, n, oHow));
+            return oPiece;
         },
-        [&](const TileStatistics& oTile)
+        [&](const std::vector<TileStatistics>& oPiece)
         {
-            for (std::size_t c = 0; c < oTotal.size(); ++c)
-                oTotal[c]->Merge(*oTile.channels[c]);
-            oCounter.Advance(oTile.bytes);
+            for (const TileStatistics& oTile : oPiece)
+            {
+                for (std::size_t c = 0; c < oTotal.size(); ++c)
+                    oTotal[c]->Merge(*oTile.channels[c]);
+                oCounter.Advance(oTile.bytes);
+            }
         });
     std::vector<ChannelStatistics> oResults;
     for (const auto& poGatherer : oTotal)
