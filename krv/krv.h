@@ -41,14 +41,16 @@
 namespace krv
 {
 
-// Files: eReadOnly, eUpdate.
+// Files: eReadOnly, eUpdate. DatasetManager opens and creates them, IDataset is an open one, and IRasterDataset the
+// part of it that has pixels.
 using ::AccessMode;
 using enum ::AccessMode;
 using datasources::DatasetManager;
 using datasources::IDataset;
 using datasources::IRasterDataset;
 
-// Rasters: eMirror and the other behaviours of margins, eDT_8U and the other types.
+// Rasters: pixels in memory with their place in the image. Mask has a bit for each pixel, PCT is a colour table,
+// RasterView gives typed rows. eMirror and the other behaviours of margins, eDT_8U and the other types.
 using ::eMarginBehaviour;
 using enum ::eMarginBehaviour;
 using gobs::Complex;
@@ -62,7 +64,8 @@ using gobs::RasterInfo;
 using gobs::RasterView;
 using enum gobs::NativeDataTypeCode;
 
-// Readers.
+// Readers: BasicReader for tiles and windows, ExactHaloReader where neighbours count, TransformRasterReader for another
+// grid, ReaderValidity for which pixels count. RasterRange walks the tiles, ForEachTile does so on all cores.
 using datasources::BasicReader;
 using datasources::ExactHaloReader;
 using datasources::ForEachTile;
@@ -76,7 +79,8 @@ using gobs::AffineMap;
 using gobs::Resampling;
 using threading::ThreadPool;
 
-// Writers.
+// Writers: BasicWriter for a new file or parts of one, ReplacingWriter for a file that appears whole or not at all,
+// WriteTiles for tiles that come from all cores. Levels and what else belongs to an image come last.
 using datasources::BasicWriter;
 using datasources::BuildOverviews;
 using datasources::CopyAllButPixels;
@@ -85,7 +89,7 @@ using datasources::IRasterWriter;
 using datasources::ReplacingWriter;
 using datasources::WriteTiles;
 
-// What belongs to an image.
+// What belongs to an image: its record of tags and no-data values, where it lies on the map, and in which system.
 using datasources::AuxiliaryData;
 using datasources::GetNoData;
 using datasources::NoDataValue;

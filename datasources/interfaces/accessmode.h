@@ -15,12 +15,12 @@ namespace krv::datasources
 // The outcome of IDataset::Delete. 0 is also what a dataset without a file of its own returns.
 enum FileAccessState
 {
-    eDone = 0,
-    eNotFound = 1,
-    eDenied = 2
+    eDone = 0,     // it is gone
+    eNotFound = 1, // there was no such file
+    eDenied = 2    // the system does not allow it, and the file stays
 };
 
-// What a facet of a dataset allows.
+// What a facet of a dataset allows, as the format and the way in which the file was opened have it.
 class KRV_DATASOURCES_API AccessCapabilities
 {
 public:
@@ -30,7 +30,9 @@ public:
     AccessCapabilities& operator=(const AccessCapabilities&) = default;
     ~AccessCapabilities();
 
+    // Takes over all three.
     void Copy(const AccessCapabilities& oOther);
+    // Its contents can be read.
     bool IsReadable() const { return mbReadable; }
     bool IsWritable() const { return mbWritable; }
     bool IsUpdatable() const { return mbUpdatable; }

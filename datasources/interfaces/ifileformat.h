@@ -17,6 +17,7 @@ public:
     // A name for people, such as "GeoTIFF".
     virtual std::string GetDescription() const = 0;
     // File name endings without the dot.
+    // None for a format that is known by its contents alone.
     virtual std::vector<std::string> GetExtensions() const = 0;
     // The name by which the manager knows the format. Upper case: GetFormatByName finds no other.
     virtual std::string GetShortName() const = 0;

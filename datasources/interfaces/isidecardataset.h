@@ -48,7 +48,9 @@ public:
     virtual void BeginSidecars() = 0;
     // The whole record, as the dataset is to answer it.
     virtual void WriteTagsBeside(const AuxiliaryData& oData) = 0;
+    // The reference system of the image. oCRS is copied.
     virtual void WriteCRSBeside(const krv::ogc::cs::ICRS& oCRS) = 0;
+    // Where the image lies on the map.
     virtual void WriteGeocodingBeside(const krv::ogc::cs::GeocodingInfo& oInfo) = 0;
 };
 

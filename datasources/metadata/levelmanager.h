@@ -76,6 +76,7 @@ private:
     virtual std::string GetImageName() const = 0;
     // The size of the image that the levels are of, in pixels.
     virtual unsigned int GetImageWidth() const = 0;
+    // Rows of it.
     virtual unsigned int GetImageHeight() const = 0;
     // Throws DataException unless the dataset may be changed. pWhat: such as "overviews cannot be written".
     virtual void CheckWriting(const char* pWhat, const Place& oPlace) const = 0;

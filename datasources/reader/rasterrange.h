@@ -17,6 +17,7 @@ namespace krv::datasources
 class RasterRange
 {
 public:
+    // One pass: two iterators are equal at the same tile, and each look at a tile reads it anew.
     class Iterator
     {
     public:
@@ -28,6 +29,7 @@ public:
 
         explicit Iterator(const RasterIterator& oPosition) : moPosition(oPosition) {}
 
+        // Reads the tile. Throws what the reader throws.
         value_type operator*() const { return value_type(*moPosition); }
         Iterator& operator++()
         {
@@ -41,8 +43,10 @@ public:
         RasterIterator moPosition;
     };
 
+    // oIterable: the caller's.
     explicit RasterRange(IRasterIterable& oIterable) : mpoIterable(&oIterable) {}
 
+    // From the top left tile on, row by row.
     Iterator begin() const { return Iterator(mpoIterable->Begin()); }
     Iterator end() const { return Iterator(mpoIterable->End()); }
 

@@ -23,13 +23,17 @@ public:
     // New rasters of this reader's type and channels with the current margins, filled by the other ReadRaster.
     krv::gobs::Raster* GetRaster(unsigned int nIndex) override;
     krv::gobs::Raster* ReadRaster(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight) override;
+    // The tile that holds a pixel; End for a pixel outside the image.
     RasterIterator FindRaster(unsigned int nX, unsigned int nY) override;
     RasterIterator Begin() override;
     RasterIterator End() override;
+    // 0 for an image without pixels.
     unsigned int GetTileCount() const override;
+    // In pixels. Iterators of the grid before lose their meaning.
     void SetTileSize(unsigned int nWidth, unsigned int nHeight) override;
     unsigned int GetTileWidth() const override;
     unsigned int GetTileHeight() const override;
+    // Pixels on each side of a tile.
     unsigned int GetXMargin() const override;
     unsigned int GetYMargin() const override;
     eMarginBehaviour GetMarginBehaviour() const override;

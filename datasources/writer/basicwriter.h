@@ -99,6 +99,7 @@ protected:
     // out.
     virtual detail::OpenedChannels MakeChannels(IRasterDataset& oDataset, const std::vector<unsigned int>& oChannels,
                                                 const krv::Place& oPlace);
+    // oDataset is a new one, and oInfo says its size, its channels and their type.
     virtual void LayOut(IRasterDataset& oDataset, const krv::gobs::RasterInfo& oInfo, const krv::Place& oPlace);
 
 private:

@@ -103,6 +103,7 @@ public:
     // 0 when it is not set.
     Sample GetValue() const { return mnValue; }
 
+    // NaN matches NaN, unlike in comparisons of C++.
     bool Matches(Sample nSample) const
     {
         if constexpr (std::is_floating_point_v<Sample>)
@@ -110,6 +111,7 @@ public:
         else
             return mbSet && nSample == mnValue;
     }
+    // A complex sample by its parts.
     bool Matches(Sample nReal, Sample nImaginary) const
     {
         return Matches(nReal) && (mbNaN ? nImaginary != nImaginary : nImaginary == Sample{0});

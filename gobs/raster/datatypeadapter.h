@@ -9,7 +9,8 @@
 namespace krv::gobs
 {
 
-// Sizes and texts of the type codes.
+// Sizes and texts of the type codes. The texts are those of messages, of metadata and of the command: U and S are
+// unsigned and signed integers, R is a real, C a complex value of two such parts; the number is the bits of one part.
 class DataTypeAdapter
 {
 public:

@@ -43,8 +43,10 @@ public:
     // Margins included.
     std::uint64_t GetFullWidth() const { return GetWidth() + 2ull * GetXMargin(); }
     std::uint64_t GetFullHeight() const { return GetHeight() + 2ull * GetYMargin(); }
+    // Bytes.
     std::uint64_t GetBufferSize() const { return mnBufferSize; }
 
+    // The first byte of the top left pixel, that of the margin where there is one. The raster owns it, or borrows it.
     unsigned char* GetBuffer() { return mpBuffer.get(); }
     const unsigned char* GetBuffer() const { return mpBuffer.get(); }
 

@@ -10,6 +10,7 @@ class RasterInfo
 {
 public:
     RasterInfo() = default;
+    // nWidth, nHeight: pixels. Nothing is checked here; whoever allocates by it does.
     RasterInfo(unsigned int nWidth, unsigned int nHeight, unsigned int nChannels, const DataType& oType)
         : mnWidth(nWidth), mnHeight(nHeight), mnChannels(nChannels), moType(oType)
     {
@@ -17,7 +18,9 @@ public:
 
     unsigned int GetWidth() const { return mnWidth; }
     unsigned int GetHeight() const { return mnHeight; }
+    // Channels, which lie pixel interleaved.
     unsigned int GetChansCount() const { return mnChannels; }
+    // The type of every channel: a raster has one type.
     const DataType& GetDataType() const { return moType; }
 
     friend bool operator==(const RasterInfo&, const RasterInfo&) = default;
@@ -40,8 +43,10 @@ public:
     {
     }
 
+    // Column and row in the image, from its top left pixel on. The margins lie before them.
     int GetX() const { return mnX; }
     int GetY() const { return mnY; }
+    // Pixels on each side, so that the full width is the width and twice this.
     unsigned int GetXMargin() const { return mnXMargin; }
     unsigned int GetYMargin() const { return mnYMargin; }
 

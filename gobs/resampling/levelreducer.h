@@ -85,6 +85,7 @@ class KRV_GOBS_API ILevelReducer
 {
 public:
     virtual ~ILevelReducer();
+    // Takes a window of the source. Throws what the targets throw when they store a tile.
     virtual void Add(const SourceWindow& oWindow) = 0;
 };
 

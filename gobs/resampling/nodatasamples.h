@@ -20,6 +20,7 @@ class KRV_GOBS_API ISampleTest
 {
 public:
     virtual ~ISampleTest();
+    // Whether any of the samples is not valid. nSamples: pixels times channels.
     virtual bool FindsAny(const unsigned char* pSamples, std::size_t nSamples) const = 0;
     // Writes a byte per sample, 1 when it is valid and else 0.
     virtual void Mark(const unsigned char* pSamples, std::size_t nSamples, unsigned char* pValid) const = 0;

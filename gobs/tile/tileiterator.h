@@ -14,8 +14,10 @@ public:
     {
     }
 
+    // Column and row of the top left pixel.
     unsigned int GetX() const { return mnX; }
     unsigned int GetY() const { return mnY; }
+    // Pixels; less than the size of the grid's tiles at the right and lower edge.
     unsigned int GetWidth() const { return mnWidth; }
     unsigned int GetHeight() const { return mnHeight; }
 
@@ -33,6 +35,7 @@ private:
 class KRV_GOBS_API TileIterator
 {
 public:
+    // The size of the image in pixels.
     TileIterator(unsigned int nWidth, unsigned int nHeight);
 
     // Sets the tile size; 0 counts as 1. Throws DataException, and changes nothing, when the grid would have more than

@@ -18,9 +18,9 @@ namespace krv::operations
 struct Finding
 {
     bool good = true;
-    std::string subject;
-    std::string found;
-    std::string remedy;
+    std::string subject; // the file, or the piece of the installation
+    std::string found;   // one sentence
+    std::string remedy;  // one sentence; empty for what is good
 };
 
 // A plug-in that loaded, with a builder of its own, apart from the manager's.

@@ -27,6 +27,7 @@ struct TableReference
     unsigned int number = 0;
 };
 
+// One channel.
 struct ChannelFacts
 {
     unsigned int number = 0; // from 1
@@ -40,6 +41,7 @@ struct ChannelFacts
     std::optional<TableReference> defaultPct;
 };
 
+// The reference system: its name, its EPSG code and WKT2 on one line.
 struct CrsFacts
 {
     std::string name;
@@ -47,6 +49,7 @@ struct CrsFacts
     std::string wkt;
 };
 
+// A level, as overview accessors number it, and its size in pixels.
 struct LevelFacts
 {
     unsigned int level = 0;
@@ -55,6 +58,7 @@ struct LevelFacts
     bool valid = true; // made of the pixels that the image has; others are passed over
 };
 
+// A bitmap by its number, from 1.
 struct BitmapFacts
 {
     unsigned int number = 0;
@@ -62,6 +66,7 @@ struct BitmapFacts
     bool validity = false; // it is the image's validity mask
 };
 
+// A colour table by its number, from 1, and the channel that it belongs to.
 struct ColourTableFacts
 {
     unsigned int number = 0;
@@ -70,6 +75,7 @@ struct ColourTableFacts
     std::size_t entries = 0;
 };
 
+// A sensor model by its number, from 1.
 struct MathModelFacts
 {
     unsigned int number = 0;
@@ -112,6 +118,7 @@ struct FileInfo
     std::optional<std::uint64_t> fileBytes;
     // What keeps the file from being read in few requests over a network; nothing for formats without such a layout.
     std::optional<std::vector<std::string>> cloudReasons;
+    // What says where the image lies; nothing when it lies nowhere.
     std::optional<PlacedBy> placedBy;
     std::optional<MapBounds> bounds;            // of the outer edges; of files with a transform
     std::optional<GeographicBounds> geographic; // the same in degrees
@@ -119,6 +126,7 @@ struct FileInfo
     std::vector<ChannelFacts> channels;
     krv::datasources::MetadataMap metadata;
     std::optional<CrsFacts> crs;
+    // x = [0] + column * [1] + row * [2] and y = [3] + column * [4] + row * [5], of outer corners of pixels.
     std::optional<std::array<double, 6>> geocoding;
     std::vector<LevelFacts> overviews;
     std::vector<BitmapFacts> bitmaps;
@@ -126,6 +134,7 @@ struct FileInfo
     std::vector<std::string> linkedFiles; // those that hold the pixels
     std::vector<ColourTableFacts> colourTables;
     std::array<unsigned int, 4> displayDefaults{}; // red, green, blue, grey; 0: none
+    // Bytes of the file that nothing in it refers to; nothing for formats that do not tell.
     std::optional<std::uint64_t> unusedBytes;
     std::vector<krv::datasources::Sidecar> sidecars; // in the order in which they are looked for
     std::optional<unsigned int> furtherImages;       // nothing where the format has no such files

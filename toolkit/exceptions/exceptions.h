@@ -16,6 +16,7 @@ namespace krv
 class KRV_TOOLKIT_API Exception : public std::exception
 {
 public:
+    // message: what a user reads. It is copied, as the other texts are.
     explicit Exception(const std::string& message, const Place& oPlace = Place::Current());
     Exception(const std::string& message, const std::string& function, const std::string& sourceFile,
               unsigned int nLine);
@@ -23,10 +24,14 @@ public:
     Exception& operator=(const Exception&);
     ~Exception() override;
 
+    // The message. The pointer is valid as long as the exception.
     const char* what() const noexcept override;
     const std::string& GetMessage() const { return moMessage; }
+    // The signature of the function that threw; empty where the throw says no place.
     const std::string& GetFunction() const { return moFunction; }
+    // The source file without its ending, from the root of the tree: "datasources/reader/basicreader".
     const std::string& GetSourceFile() const { return moSourceFile; }
+    // The line in the source file; 0 where the throw says no place.
     unsigned int GetLine() const { return mnLine; }
 
 private:
@@ -46,7 +51,8 @@ public:
     ~DataException() override;
 };
 
-// A parameter outside its set of values.
+// A parameter outside its set of values. It tells which parameter, so that a program may ask its user for another
+// value.
 class KRV_TOOLKIT_API ParameterException : public Exception
 {
 public:
@@ -61,7 +67,9 @@ public:
                        const std::string& sourceFile, unsigned int nLine);
     ~ParameterException() override;
 
+    // One of eType.
     int GetType() const { return mnType; }
+    // The parameter's name in the source, such as "eDataType".
     const std::string& GetParameter() const { return moParameter; }
 
 private:
@@ -78,6 +86,7 @@ public:
                   const std::string& sourceFile, unsigned int nLine);
     ~FileException() override;
 
+    // The path as it was given to the operation that failed.
     const std::string& GetFileName() const { return moFileName; }
 
 private:
@@ -95,7 +104,7 @@ public:
     ~FileNotFoundException() override;
 };
 
-// The file is in no known format, or is damaged.
+// The file is in no known format, or is damaged: what it says of itself cannot be. Reading it again does not help.
 class KRV_TOOLKIT_API FileFormatException : public FileException
 {
 public:
@@ -106,7 +115,7 @@ public:
     ~FileFormatException() override;
 };
 
-// Reading or writing failed.
+// Reading or writing failed, such as on a full disk. What a caller's buffer then holds is undefined.
 class KRV_TOOLKIT_API IOException : public FileException
 {
 public:
@@ -126,21 +135,22 @@ public:
                 unsigned int nLine);
     ~OSException() override;
 
+    // The system's error number, such as ENOSPC.
     int GetError() const { return mnError; }
 
 private:
     int mnError;
 };
 
-// A plug-in library cannot be used.
+// A plug-in library cannot be used. The start of the manager ends with it, and the next call tries again.
 class KRV_TOOLKIT_API LibraryException : public Exception
 {
 public:
     enum eType
     {
-        eLibraryNotFound = 1,
-        eEntryPointNotFound = 2,
-        eVersionMismatch = 3
+        eLibraryNotFound = 1,    // there is no such file, or the system's loader refused it
+        eEntryPointNotFound = 2, // the library is no format plug-in
+        eVersionMismatch = 3     // it was built for another version of this library
     };
 
     LibraryException(const std::string& libraryFile, int nType, const std::string& message,
@@ -149,7 +159,9 @@ public:
                      const std::string& sourceFile, unsigned int nLine);
     ~LibraryException() override;
 
+    // The library as the format's description names it.
     const std::string& GetLibraryFile() const { return moLibraryFile; }
+    // One of eType.
     int GetType() const { return mnType; }
 
 private:
@@ -167,6 +179,7 @@ public:
                          const std::string& function, const std::string& sourceFile, unsigned int nLine);
     ~OutOfBoundsException() override;
 
+    // Those that are out of range, in the order in which the operation got them.
     const std::vector<unsigned int>& GetIndices() const { return moIndices; }
 
 private:

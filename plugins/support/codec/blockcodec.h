@@ -42,6 +42,7 @@ public:
     // Codings of several editions, of which an image has one: how many bytes of a block tell which, and the begin of
     // such a block, none for an image without, that those to come are to be like.
     virtual std::size_t GetFormBytes() const { return 0; }
+    // Blocks that are encoded from now on are of the edition that these bytes tell.
     virtual void TakeForm(std::span<const unsigned char>) {}
 };
 

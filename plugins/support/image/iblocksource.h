@@ -36,6 +36,7 @@ class IBlockSource
 public:
     virtual ~IBlockSource();
 
+    // Size, blocks, channels and type. It belongs to the source.
     virtual const ImageLayout& GetLayout() const = 0;
 
     // Reads a part of a block. oPart counts from the block's own corner and lies inside the block and the image. Row r

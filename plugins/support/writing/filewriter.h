@@ -48,6 +48,7 @@ public:
 protected:
     // Brings what changed, and what is held back, into the file and to the disk. Not called without a file.
     virtual void Store() = 0;
+    // Whether Store would have anything to do.
     virtual bool HoldsChanges() const = 0;
     // Gives a new file that is whole its name.
     virtual void GiveName();

@@ -39,7 +39,9 @@ public:
     // The definition as WKT2:2019 on one line; as WKT1 (the dialect that older packages and .prj files use); as
     // PROJJSON. GetWKT1 throws for a system that WKT1 cannot express.
     virtual std::string GetWKT() const = 0;
+    // WKT1 on one line. Throws krv::DataException for a system that it cannot express.
     virtual std::string GetWKT1() const = 0;
+    // PROJJSON on one line.
     virtual std::string GetPROJJSON() const = 0;
 
     // Whether both describe the same system: same datum, ellipsoid, projection and parameters. Names, and the order in
@@ -48,6 +50,7 @@ public:
 
     // Kind of the horizontal part (that of the base system for a bound, of the first part for a compound one).
     virtual bool IsGeographic() const = 0;
+    // Whether the horizontal axes are eastings and northings.
     virtual bool IsProjected() const = 0;
 
     // Whether heights belong to the system: a compound with a vertical part, or a three-dimensional system.
@@ -56,16 +59,20 @@ public:
     // Unit of the horizontal axes: its name, such as "metre" or "degree", and its size in metres, or in radians for a
     // geographic system.
     virtual std::string GetUnitName() const = 0;
+    // Metres, or radians for a geographic system, in one unit.
     virtual double GetUnitFactor() const = 0;
 
     // Names such as "World Geodetic System 1984 ensemble", "WGS 84", "Transverse Mercator"; empty when there is no such
     // part (engineering systems have no datum of this kind, geographic ones no projection).
     virtual std::string GetDatumName() const = 0;
+    // Such as "WGS 84"; empty when there is none.
     virtual std::string GetEllipsoidName() const = 0;
+    // Such as "Transverse Mercator"; empty for a system that is not projected.
     virtual std::string GetProjectionMethod() const = 0;
 
     // Ellipsoid: semi-major axis in metres and inverse flattening (0 for a sphere). 0 and 0 when there is none.
     virtual double GetSemiMajorAxis() const = 0;
+    // The inverse flattening has no unit.
     virtual double GetInverseFlattening() const = 0;
 
     // The parameters of the projection in the order of its definition; empty for systems that are not projected.
