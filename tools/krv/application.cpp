@@ -31,7 +31,7 @@ constexpr char FOOTER[] =
     "  krv info scene.tif                                everything known of a file\n"
     "  krv stats scene.tif --json                        statistics per channel, for other programs\n"
     "  krv view scene.tif look.png --size 800            a quick look\n"
-    "  krv view \"loop.gif[page=3]\" look.png            a page of an animation\n"
+    "  krv view \"loop.gif[page=3]\" look.png              a page of an animation\n"
     "  krv convert scene.tif copy.tif --options COMPRESS=ZSTD\n"
     "  krv overviews scene.tif                           overview levels, powers of two\n"
     "  krv edit scene.tif --no-data 0 --crs EPSG:32633   what the file says, in place\n"
