@@ -59,13 +59,10 @@ std::string FacetsBeside::GetBitmapDescription(unsigned int nBitmap) const
     return FindMask(nBitmap).DescribeMask(nBitmap);
 }
 
-// Others would take a zone beside the file for validity.
 void FacetsBeside::RefuseZone(Sidecars& oSidecars, const Place& oPlace) const
 {
     oSidecars.DropZone();
-    RefuseBeside("a zone cannot be kept beside the file: a bitmap without a description, the validity mask, can, or "
-                 "one that is tagged as that of a channel",
-                 oPlace);
+    RefuseBeside(NO_ZONES, oPlace);
 }
 
 void FacetsBeside::SetBitmapDescription(unsigned int nBitmap, const std::string& oDescription)

@@ -131,8 +131,7 @@ bool HasUsableLevels(const std::string& fileName)
 // A zone would be taken for validity by others.
 [[noreturn]] void RefuseZone(const std::string& fileName)
 {
-    throw DataException(fileName + ": a zone cannot be kept beside the file: a bitmap without a description, the "
-                                   "validity mask, can");
+    throw DataException(fileName + ": " + NO_ZONES);
 }
 
 // All of its pixels valid.

@@ -25,6 +25,11 @@ namespace krv::plugins::support
 // What is added to the numbers of masks, and of models, where the format counts its own from 1 on.
 inline constexpr unsigned int FIRST_BESIDE = 65535;
 
+// Others would take a zone beside the file for validity.
+inline constexpr char NO_ZONES[] =
+    "a zone cannot be kept beside the file: a bitmap without a description, the validity mask, can, or one that is "
+    "tagged as that of a channel";
+
 // The files beside an image that say what its own file does not. Each is looked for by its exact names when somebody
 // asks for what it says, and read once. One that cannot be used is warned of and is as if it were not there. A file
 // that is itself a sidecar, by its ending, has none. One thread at a time.

@@ -529,17 +529,15 @@ constexpr std::size_t VECTOR_BYTES = 16;
 constexpr std::size_t LOAD_BYTES = 16;
 #endif
 
-inline std::uint16_t TurnRound(std::uint16_t nWord)
+template <typename TWord>
+inline TWord TurnRound(TWord nWord)
 {
-    return __builtin_bswap16(nWord);
-}
-inline std::uint32_t TurnRound(std::uint32_t nWord)
-{
-    return __builtin_bswap32(nWord);
-}
-inline std::uint64_t TurnRound(std::uint64_t nWord)
-{
-    return __builtin_bswap64(nWord);
+    if constexpr (sizeof(TWord) == 2)
+        return __builtin_bswap16(nWord);
+    else if constexpr (sizeof(TWord) == 4)
+        return __builtin_bswap32(nWord);
+    else
+        return __builtin_bswap64(nWord);
 }
 
 template <typename TWord, std::size_t NCount>

@@ -38,9 +38,6 @@ using MergeLoop = std::size_t (*)(const MergeTerm* pTerms, std::size_t nTerms, u
 // Packed values of a number of bytes in the other byte order, in place or to elsewhere.
 using Swapper = void (*)(const unsigned char* pSource, unsigned char* pTarget, std::size_t nCount);
 
-// Packed values of a number of bytes in the other byte order, in place or to elsewhere.
-using Swapper = void (*)(const unsigned char* pSource, unsigned char* pTarget, std::size_t nCount);
-
 // The inner loops, compiled for one instruction set.
 struct Kernels
 {
