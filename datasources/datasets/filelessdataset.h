@@ -13,6 +13,7 @@ namespace krv::datasources
 
 // The base of datasets that no file lies behind: they have a descriptive name, no format, and nothing that could be
 // deleted. What a derived class does not override is refused with a DataException that names the dataset.
+// A program's own source of pixels derives from it: name, size, types and an IRasterIO are all that it needs.
 class KRV_DATASOURCES_API FilelessDataset : public IDataset, public IRasterDataset, public IGeocodedDataset
 {
 public:
@@ -23,10 +24,16 @@ public:
     IFileFormat* GetFileFormat() const override { return nullptr; }
     // Deletes nothing.
     FileAccessState Delete() override { return eDone; }
+
+    // True, since there is nothing that could be missing; a derived class without an image yet says otherwise.
     bool Exists() const override { return true; }
     // A text for messages; no path.
     std::string GetName() override { return moName; }
+
+    // A derived class over other datasets says true.
     bool IsLinked() const override { return false; }
+
+    // Nothing is pending here. Throws DataException after Close.
     void Synchronize() override { CheckOpen(); }
     bool IsOpen() const override { return mbOpen; }
     // From then on reading and writing throw DataException.
@@ -56,7 +63,7 @@ protected:
     void CheckRecord(const AuxiliaryData& oData, const Place& oPlace = Place::Current()) const;
 
 private:
-    std::string moName;
+    std::string moName; // for messages
     bool mbOpen = true;
 };
 

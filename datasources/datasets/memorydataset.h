@@ -13,6 +13,7 @@
 namespace krv::datasources
 {
 
+// Example: {"mosaic", std::uint64_t{4} << 30, -9999} for at most 4 GiB, and -9999 where nothing is written.
 struct MemoryOptions
 {
     static constexpr std::uint64_t NO_CEILING = std::numeric_limits<std::uint64_t>::max();
@@ -37,13 +38,18 @@ struct MemoryOptions
 class KRV_DATASOURCES_API MemoryDataset : public FilelessDataset, public IBitmapDataset, public IPCTDataset
 {
 public:
+    // The options are copied. Allocates no pixels.
     explicit MemoryDataset(const MemoryOptions& oOptions = {});
+
+    // Another access to the same contents, as Share.
     MemoryDataset(const MemoryDataset& oOther);
     ~MemoryDataset() override;
 
     // A new access to the same contents.
+    // For those who take an IDataset and know nothing of its kind. What one access writes the others read.
     std::unique_ptr<IDataset> Share() const;
     // The bytes of all pixels that there are.
+    // Of tiles that were written, of the image, its levels and bitmaps. It is what the ceiling bounds.
     std::uint64_t GetBytes() const;
 
     // From Create on.
@@ -55,6 +61,7 @@ public:
     void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;
     void Synchronize() override;
 
+    // Blocks of 256 x 256 pixels. It keeps the contents alive by itself.
     IRasterIO* GetRasterIO(const std::vector<unsigned int>& oChannels) override;
     void AddNewChannel(const krv::gobs::RasterInfo& oInfo) override;
     void DeleteChannel(unsigned int nChannel) override;
@@ -65,11 +72,14 @@ public:
     unsigned int GetChanCount() const override;
     IChannelInfo* GetChannelInfo(unsigned int nChannel) const override;
     IOverviewManager* GetOverviewManager() override;
+
+    // All that can be done with a raster.
     AccessCapabilities GetRasterCapabilities() override { return {true, true, true}; }
 
     const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override;
     void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) override;
 
+    // Bitmaps, as IBitmapDataset has them; a byte for each pixel of a tile that was written.
     std::vector<unsigned int> GetBitmapList() const override;
     IRasterIO* GetBitmapIO(const std::vector<unsigned int>& oBitmaps) override;
     void DeleteBitmap(unsigned int nBitmap) override;
@@ -81,6 +91,7 @@ public:
     // Levels of the validity mask; null without one.
     IOverviewManager* GetBitmapOverviewManager() override;
 
+    // Colour tables, as IPCTDataset has them: any number, each of a channel or of none.
     std::vector<unsigned int> GetPCTList() const override;
     krv::gobs::PCT* GetPCT(unsigned int nPCT) const override;
     unsigned int GetPCTChannel(unsigned int nPCT) const override;

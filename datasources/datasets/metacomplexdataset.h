@@ -12,10 +12,11 @@ namespace krv::datasources
 {
 
 // Two real channels, from 1, that are one complex channel: I and Q, or amplitude and phase.
+// Channel n of the dataset is pair n of the list. A channel may be in several pairs.
 struct ComplexPair
 {
-    unsigned int mnFirst;
-    unsigned int mnSecond;
+    unsigned int mnFirst;  // of the first source: I or amplitude
+    unsigned int mnSecond; // of the second, or of the only one: Q or phase
 };
 
 enum eComplexForm
@@ -40,6 +41,7 @@ enum eComplexForm
 //
 // Levels are those that both channels have in one size. Levels of amplitudes and phases are made and offered only by
 // the method NEAREST: the mean of phases is none.
+// Example: I and Q in two files: MetaComplexDataset oScene("i.tif", "q.tif", {{1, 1}});
 class KRV_DATASOURCES_API MetaComplexDataset : public FilelessDataset, public IBitmapDataset
 {
 public:
@@ -67,6 +69,8 @@ public:
     // Tags go back to the channels that they are of. A no-data value that is not the one that was read goes to both.
     void WriteAuxiliaryData(const AuxiliaryData& oData) override;
     krv::ogc::cs::ICRS* ReadCRS() const override;
+
+    // To the first source, which says whether it can be changed.
     void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;
     bool IsLinked() const override { return true; }
     void Synchronize() override;
@@ -79,6 +83,8 @@ public:
     unsigned int GetChanCount() const override;
     IChannelInfo* GetChannelInfo(unsigned int nChannel) const override;
     IOverviewManager* GetOverviewManager() override;
+
+    // What both sources allow.
     AccessCapabilities GetRasterCapabilities() override;
 
     const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override;

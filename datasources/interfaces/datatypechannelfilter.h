@@ -7,9 +7,11 @@ namespace krv::datasources
 {
 
 // Accepts the channels of exactly one data type, all six fields compared.
+// Example: BasicReader oReader("scene.tif", DataTypeChannelFilter(eDT_16U)) reads all channels of 16 bits.
 class KRV_DATASOURCES_API DataTypeChannelFilter : public IChannelFilter
 {
 public:
+    // The type is copied; it need not be one of the table. Any thread may ask.
     explicit DataTypeChannelFilter(const krv::gobs::DataType& oType);
     DataTypeChannelFilter(const DataTypeChannelFilter&);
     DataTypeChannelFilter& operator=(const DataTypeChannelFilter&);

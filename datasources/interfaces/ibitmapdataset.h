@@ -26,6 +26,10 @@ class IRasterIO;
 // these beside the mask of the image.
 inline constexpr char VALIDITY_OF_CHANNEL[] = "ValidityOfChannel";
 
+// Example, the validity mask of a file that was opened for update:
+//   const unsigned int nMask = poBitmaps->CreateBitmap();
+//   poBitmaps->SetBitmapDescription(nMask, "");
+//   WriteMask(*poBitmaps, oMask, nMask);
 class KRV_DATASOURCES_API IBitmapDataset
 {
 public:
@@ -55,8 +59,10 @@ public:
 };
 
 // The number of the validity mask; 0 when there is none.
+// Asks for list and descriptions; no pixel is read.
 KRV_DATASOURCES_API unsigned int FindValidityMask(const IBitmapDataset& oBitmaps);
 // The bitmaps that say it of single channels, by the number of the channel; of several the one with the lowest number.
+// Tags that are no number of a channel count for nothing.
 KRV_DATASOURCES_API std::map<unsigned int, unsigned int> FindChannelMasks(const IBitmapDataset& oBitmaps);
 
 } // namespace krv::datasources

@@ -11,6 +11,7 @@ namespace krv::datasources
 
 // Makes the bytes of blocks from their pixels, without a look at the file. One thread at a time, any thread; others may
 // use encoders of their own for the same image meanwhile. The order of the virtual operations is public and fixed.
+// Keeps its working memory from block to block; destroyed by any thread, after the dataset too.
 class KRV_DATASOURCES_API IBlockEncoder
 {
 public:
@@ -25,6 +26,7 @@ public:
 
 // Encoding apart from storing: a facet of datasets that have IEncodedBlocks too, found by dynamic_cast. So blocks can
 // be encoded on all cores while one thread stores them. The order of the virtual operations is public and fixed.
+// SplitWriter uses both facets; programs that write rasters need neither.
 class KRV_DATASOURCES_API IBlockEncoding
 {
 public:

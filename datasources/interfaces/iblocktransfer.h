@@ -12,6 +12,7 @@ class IDataset;
 
 // Encoded blocks from file to file, without their way through the program: a facet of datasets that have IEncodedBlocks
 // too, found by dynamic_cast. One thread at a time. The order of the virtual operations is public and fixed.
+// Blocks that are neither decoded nor encoded are copied at the speed of the disk, without loss whatever the codec.
 class KRV_DATASOURCES_API IBlockTransfer
 {
 public:

@@ -12,6 +12,7 @@ namespace krv::datasources
 {
 
 // The description of one channel. The order of the virtual operations is public and fixed.
+// References that it gives live as long as it. Any thread.
 class KRV_DATASOURCES_API IChannelInfo
 {
 public:

@@ -47,6 +47,7 @@ struct EncodedForm
 };
 
 // A block in the grid of its plane, counted from 0.
+// Plane 0 has all channels unless the form says that each has blocks of its own.
 struct BlockNumber
 {
     unsigned int mnPlane = 0;
@@ -58,12 +59,15 @@ struct BlockNumber
 // 1 for the image, or the number of one of its levels. Whoever encodes blocks in the form of an image, on as many
 // threads as it likes, stores them here one after the other. One thread at a time. The order of the virtual operations
 // is public and fixed.
+// Example: a copy without decoding, where both files have the facet and SetEncodedForm took the form of the source:
+//   if (poFrom->ReadEncoded(1, oBlock, oBytes)) poTo->StoreEncoded(1, oBlock, oBytes.data(), oBytes.size());
 class KRV_DATASOURCES_API IEncodedBlocks
 {
 public:
     virtual ~IEncodedBlocks();
 
     // Throws DataException for a level that does not exist.
+    // A copy, which stays as it is when the file changes.
     virtual EncodedForm GetEncodedForm(unsigned int nLevel) = 0;
 
     // The bytes of a block as stored. False for a block that is not stored: its pixels are all 0. Throws DataException
@@ -78,6 +82,7 @@ public:
     virtual bool SetEncodedForm(unsigned int nLevel, const EncodedForm& oForm) = 0;
 
     // Stores bytes as a block in the place of what it held; they are taken as they are. Counts as a change of pixels.
+    // Throws DataException for a block outside the grid and for a dataset that is not open for writing.
     virtual void StoreEncoded(unsigned int nLevel, const BlockNumber& oBlock, const unsigned char* pBytes,
                               std::size_t nBytes) = 0;
 };

@@ -14,6 +14,7 @@ namespace krv::datasources
 {
 
 // The orbits of a dataset, in numbered segments. The order of the virtual operations is public and fixed.
+// Formats that only keep orbits need not make models of them: LoadMathModel tries, and tells.
 class KRV_DATASOURCES_API IEphemerisDataset
 {
 public:
@@ -36,8 +37,8 @@ public:
 // Records of a segment as they were stored.
 struct EphemerisRecords
 {
-    std::string kind;
-    std::vector<unsigned char> bytes;
+    std::string kind;                 // as CreateEphemeris got it
+    std::vector<unsigned char> bytes; // in the layout that the kind stands for
 };
 
 // A dataset that hands its orbits out as records, whether or not it makes models of them. The order of the virtual

@@ -11,6 +11,7 @@ namespace krv::datasources
 {
 
 // The affine georeferencing of a dataset. The order of the virtual operations is public and fixed.
+// Sensor models and control points are other ways to place an image: IMathModelDataset, and tags of the record.
 class KRV_DATASOURCES_API IGeocodedDataset
 {
 public:

@@ -10,6 +10,7 @@ namespace krv::datasources
 {
 
 // How a file is laid out, for people who look at it. The order of the virtual operations is public and fixed.
+// No pixel is decoded for the answers.
 class KRV_DATASOURCES_API ILayoutDataset
 {
 public:

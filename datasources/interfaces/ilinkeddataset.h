@@ -9,6 +9,7 @@ namespace krv::datasources
 {
 
 // A dataset whose channels may lie in other files. The order of the virtual operations is public and fixed.
+// IDataset::IsLinked tells whether any pixel lies elsewhere.
 class KRV_DATASOURCES_API ILinkedDataset
 {
 public:

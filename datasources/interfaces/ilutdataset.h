@@ -10,6 +10,7 @@ namespace krv::datasources
 
 // A lookup table: what becomes of values of a channel when it is shown or used. Between entries results are
 // interpolated linearly, before the first and behind the last they stay the same.
+// Values ascend in a table. Example: {{0, 0}, {4095, 255}} shows 12 bits in 8.
 struct LookupEntry
 {
     double value = 0.0;
@@ -21,6 +22,7 @@ using LookupTable = std::vector<LookupEntry>;
 
 // The lookup tables of a dataset, each with a number from 1, as reference tags of the layer "LUT" name them. The order
 // of the virtual operations is public and fixed.
+// Tables are kept and handed out; readers do not apply them.
 class KRV_DATASOURCES_API ILUTDataset
 {
 public:

@@ -13,6 +13,7 @@ namespace krv::datasources
 {
 
 // The sensor models of a dataset, in numbered segments. The order of the virtual operations is public and fixed.
+// LoadMathModel chooses among models and orbits and is what programs call.
 class KRV_DATASOURCES_API IMathModelDataset
 {
 public:

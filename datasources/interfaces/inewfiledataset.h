@@ -7,6 +7,7 @@ namespace krv::datasources
 
 // A dataset whose file may still have to get its name: until then IDataset::Delete removes what was made and leaves
 // another file of the name alone. The order of the virtual operations is public and fixed.
+// Writers of new files ask for it; a program with a dataset of DatasetManager::NewDataset may do so itself.
 class KRV_DATASOURCES_API INewFileDataset
 {
 public:

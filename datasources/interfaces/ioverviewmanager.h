@@ -14,6 +14,7 @@ class IRasterIO;
 // The overviews (reduced-resolution levels) of a raster dataset. A level's number is its reduction factor: 2, 4, 8.
 // Channels are the file's, from 1. Managers are used while their dataset lives but may be destroyed after it: a
 // destructor touches no dataset. The order of the virtual operations is public and fixed.
+// BuildOverviews makes the pixels of levels; this is the directory of them. One thread at a time, that of the dataset.
 class KRV_DATASOURCES_API IOverviewManager
 {
 public:

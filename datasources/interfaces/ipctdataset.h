@@ -15,6 +15,7 @@ namespace krv::datasources
 
 // The pseudocolour tables of a dataset, each with a number from 1. The order of the virtual operations is public and
 // fixed.
+// FindPCT finds the table of a channel and is what programs call; PCTRasterReader shows the colours.
 class KRV_DATASOURCES_API IPCTDataset
 {
 public:

@@ -6,6 +6,7 @@ namespace krv::datasources
 {
 
 // A dataset that can forget where its image lies. The order of the virtual operations is public and fixed.
+// UpdateCRS and SetGeocoding replace; they cannot say "none".
 class KRV_DATASOURCES_API IPlaceRemoval
 {
 public:

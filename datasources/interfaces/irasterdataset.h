@@ -20,6 +20,7 @@ class IOverviewManager;
 class IRasterIO;
 
 // The image channels of a dataset, numbered from 1. The order of the virtual operations is public and fixed.
+// Programs mostly use readers and writers, which bring tiles, margins and ownership; this is what those stand on.
 class KRV_DATASOURCES_API IRasterDataset
 {
 public:

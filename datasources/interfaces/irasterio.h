@@ -8,6 +8,10 @@ namespace krv::datasources
 // Windowed pixel transfer over a fixed list of channels, all of one data type. Positions count whole pixels from the
 // top left corner. Buffers are pixel interleaved, rows top to bottom, no padding, channels in the order of the list.
 // The order of the virtual operations is public and fixed. One thread at a time.
+// Example: a window of 256 x 256 pixels of 3 channels of 16 bits:
+//   std::vector<unsigned char> oPixels(256 * 256 * 3 * 2);
+//   poRasterIO->ReadWindow(1024u, 512u, 256u, 256u, oPixels.data());
+// Nothing need be aligned.
 class KRV_DATASOURCES_API IRasterIO
 {
 public:

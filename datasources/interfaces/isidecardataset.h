@@ -17,15 +17,17 @@ namespace krv::datasources
 class AuxiliaryData;
 
 // A file beside a dataset's own that says more of the image.
+// Each file is listed once, by what it says first of all: ".aux.xml" as metadata, whatever else is in it.
 struct Sidecar
 {
-    std::string moFile;
+    std::string moFile;    // the path, as it was found
     std::string moSays;    // what of: "geocoding", "reference system", "metadata", "mask", "sensor model", "levels"
     bool mbUsed = false;   // whether the dataset answers by it
     std::string moTrouble; // why it is not used, though it would be; or that it is older than the file
 };
 
 // A dataset that looks for files beside its own. The order of the virtual operations is public and fixed.
+// Such as ".aux.xml", ".ovr", ".msk", world files and ".prj".
 class KRV_DATASOURCES_API ISidecarDataset
 {
 public:

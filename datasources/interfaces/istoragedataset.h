@@ -9,6 +9,7 @@ namespace krv::datasources
 {
 
 // What a dataset tells of the file that it lies in. The order of the virtual operations is public and fixed.
+// A new file with the same contents has none of these bytes: writing one is how they are got rid of.
 class KRV_DATASOURCES_API IStorageDataset
 {
 public:

@@ -11,6 +11,7 @@ namespace krv::datasources
 {
 
 // A dataset whose file carries checksums. The order of the virtual operations is public and fixed.
+// Pixels that are read are checked as well, each block by its own sum; this looks at all of the file at once.
 class KRV_DATASOURCES_API IVerifiedDataset
 {
 public:
@@ -22,6 +23,7 @@ public:
     // Reads every byte of the state that is open and compares all checksums, whatever was read before. What is wrong,
     // a line for each place in the file; empty when everything is right. Throws what reading the file throws when it
     // cannot be read at all.
+    // Takes as long as reading the file.
     virtual std::vector<std::string> Verify(const Progress& oProgress) = 0;
 };
 

@@ -10,6 +10,7 @@ namespace krv::datasources
 {
 
 // A rectangle of pixels inside an image or a block.
+// A plain value: columns from mnX to mnX + mnWidth - 1, rows likewise. Nothing is checked.
 struct PixelRect
 {
     unsigned int mnX = 0;
@@ -23,12 +24,14 @@ struct PixelRect
 // The arithmetic of windows against an image, with its checks: null buffers, sizes that overflow, a part outside its
 // window, a window outside the image. What is left for a derived class to transfer is a rectangle inside the image.
 // Base is IRasterIO or IOverviewIO.
+// A plug-in derives its I/O from this and says the size, the bytes of a pixel and how a rectangle is transferred.
 template <typename Base>
 class KRV_DATASOURCES_API WindowedIO : public Base
 {
 public:
     ~WindowedIO() override;
 
+    // The four are final: what they refuse, they refuse for all formats in the same words. Errors are IRasterIO's.
     void ReadWindow(int nX, int nY, unsigned int nWidth, unsigned int nHeight, unsigned int nPartX, unsigned int nPartY,
                     unsigned int nPartWidth, unsigned int nPartHeight, unsigned char* pBuffer) final;
     void ReadWindow(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight,

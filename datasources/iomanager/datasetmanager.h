@@ -19,6 +19,8 @@ class IFileIOBuilder;
 
 // Knows every format and opens and creates datasets by file name. There is one in a process; the first GetInstance()
 // makes it and loads the format libraries that the registry lists.
+// Example: std::unique_ptr<IDataset> poFile(DatasetManager::GetInstance()->Open("scene.tif", eReadOnly));
+// Open and NewDataset may be called by any thread; each dataset is one thread's at a time.
 class KRV_DATASOURCES_API DatasetManager
 {
 public:
@@ -44,6 +46,7 @@ public:
     // primary ones, then the others. The caller owns the result, which may be null when a builder returned null. Throws
     // FileNotFoundException when the file cannot be read, FileFormatException when nobody recognises it, both with an
     // empty message, and whatever the builder throws.
+    // Recognising reads the file's first bytes alone; what is behind them is the format's affair.
     IDataset* Open(const std::string& fileName, AccessMode eMode);
 
     // Opens a file with the non-primary builder of one format. Null when there is none or it throws a krv::Exception.
@@ -52,9 +55,12 @@ public:
 
     // Creates a file of a type; types without a format of their own go to the generic builder with the type in the
     // options. A format that cannot create opens the existing file for update instead. The caller owns the result.
+    // fileType: a short name, such as "TIF". options: KEY=VALUE separated by blanks. Throws DataException for an
+    // option that is not known.
     IDataset* NewDataset(const std::string& fileName, const std::string& fileType, const std::string& options);
 
     // Whether Open succeeds; a builder that returns null counts as success, intended: it recognised the file.
+    // Opens and closes the file: as costly as opening it.
     bool CanOpen(const std::string& fileName, AccessMode eMode);
 
     // The query is turned to upper case, registered names are not: a name with lower-case letters is never found here,
@@ -62,6 +68,7 @@ public:
     const IFileFormat* GetFormatByName(const std::string& shortName) const;
 
     // Every format in the order of registration.
+    // Formats belong to their builders, which go with the manager.
     const std::vector<const IFileFormat*>& GetFormatList() const;
 
     // What a format can do; the name counts letter by letter. The manager keeps the result. Any thread.

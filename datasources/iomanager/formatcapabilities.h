@@ -10,10 +10,12 @@ namespace krv::datasources
 // What a format's description file says that the format can do. An XPath that finds a node is a yes, whatever the node
 // holds, and so is an empty element: a description leaves out what the format cannot do, intended. Every query reads
 // the file again, so that an edited description counts at once.
+// Any thread. Example: oManager.GetCapabilities("TIF").IsSupported(CAPABILITY_CREATE).
 class KRV_DATASOURCES_API FormatCapabilities
 {
 public:
     // xmlPath: the description file; it is not opened here.
+    // Programs get objects from the manager instead (DatasetManager::GetCapabilities).
     explicit FormatCapabilities(const std::string& xmlPath);
     FormatCapabilities(const FormatCapabilities& oOther);
     FormatCapabilities& operator=(const FormatCapabilities& oOther);
@@ -24,6 +26,7 @@ public:
 
     // The number in the node's text. No node, a text that is no unsigned 64-bit decimal number, or a file that is
     // missing or broken: 18446744073709551615, no limit. Never throws.
+    // For limits such as the most channels of a format.
     unsigned long long GetLimit(const std::string& xpath) const;
 
 private:
@@ -38,6 +41,8 @@ inline constexpr char CAPABILITY_METADATA[] = "/Format/Capabilities/Dataset/Supp
 inline constexpr char CAPABILITY_GEOREFERENCING[] = "/Format/Capabilities/Dataset/SupportsGeoreferecing";
 // The levels of a new file come with its pixels: they cannot be made apart, and are there when it is opened again.
 inline constexpr char CAPABILITY_MAKES_LEVELS[] = "/Format/Capabilities/Dataset/MakesLevels";
+
+// What a file of the format can get and lose after it was made; a file that is only read has none of it.
 inline constexpr char CAPABILITY_BITMAP_CREATE[] = "/Format/Capabilities/Bitmap/CanCreate";
 inline constexpr char CAPABILITY_BITMAP_DELETE[] = "/Format/Capabilities/Bitmap/CanDelete";
 inline constexpr char CAPABILITY_CONTROL_POINT_CREATE[] = "/Format/Capabilities/ControlPoint/CanCreate";

@@ -21,6 +21,7 @@ namespace krv::datasources
 // printed.
 
 // The first selected node, null when none matches; it belongs to the document.
+// XML support is started (XmlSession) and the document lives while its nodes are used. One thread at a time.
 KRV_DATASOURCES_API xalanc::XalanNode* SelectSingleNode(const std::string& xpath, xalanc::XalanDocument* poDocument);
 
 // The text of the first child of the first selected node, without surrounding white space; empty when no node matches.

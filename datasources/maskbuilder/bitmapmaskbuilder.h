@@ -21,6 +21,7 @@ class IRasterReader;
 // Makes masks from a bitmap of a file: a set bit is one that the file has set, as it is stored. Margins that the file
 // does not have are mirrored, eMirror; what the reader refuses, it refuses here. Copies share the reader and, when it
 // is owned, the dataset; the last one deletes them. One thread at a time, copies included.
+// Example: the mask of a tile by bitmap 2: BitmapMaskBuilder("scene.tif", 2).BuildMask(*poTile); the caller owns it.
 class KRV_DATASOURCES_API BitmapMaskBuilder : public krv::gobs::IMaskBuilder
 {
 public:
@@ -36,6 +37,7 @@ public:
     // The reader goes before the dataset.
     ~BitmapMaskBuilder() override;
 
+    // A new mask over the full extent, owned by the caller. Throws what reading the file throws.
     krv::gobs::Mask* BuildMask(const krv::gobs::Raster& oRaster) const override;
     // The region by size and place alone: width and height of the one, position and margins of the other.
     krv::gobs::Mask* BuildMask(const krv::gobs::RasterInfo& oInfo, const krv::gobs::RasterContext& oContext) const;

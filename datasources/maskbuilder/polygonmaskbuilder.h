@@ -23,15 +23,20 @@ class MaskRows;
 // those whose centres lie between the two, and always the first of them, intended: thin parts do not vanish. Every
 // polygon is filled even-odd by itself. The arguments of the polygons are those of GGLPolyRaster and mean what they
 // mean there.
+// Polygons are scan converted when they are added; a mask then costs time by its rows and their crossings. Copies are
+// apart
+// from each other. Masks may be built by several threads at once as long as nobody adds or clips.
 class KRV_DATASOURCES_API PolygonMaskBuilder : public krv::gobs::IMaskBuilder
 {
 public:
+    // The shape, or the vertices, are borrowed for the call alone.
     PolygonMaskBuilder(const GGLShape& oShape, int nFirstRow, int nRows);
     PolygonMaskBuilder(const GDBVertex* poVertices, int nVertices, const int* pnRingStarts, int nRings, int nRows);
     PolygonMaskBuilder(const PolygonMaskBuilder&);
     PolygonMaskBuilder& operator=(const PolygonMaskBuilder&);
     ~PolygonMaskBuilder() override;
 
+    // Another one beside those that there are.
     void AddPolygon(const GGLShape& oShape, int nFirstRow, int nRows);
     void AddPolygon(const GDBVertex* poVertices, int nVertices, const int* pnRingStarts, int nRings, int nRows);
 

@@ -18,6 +18,8 @@ namespace krv::datasources
 // The textual metadata of a dataset: tags of the file, tags of each channel, and a free-text description per channel.
 // A plain value. Channels count from 1; a channel number of 0 or above the count throws OutOfBoundsException
 // "Out of bounds." and leaves the object untouched. May be read by several threads at once.
+// Changes are the program's alone until a dataset or a writer gets the record (WriteAuxiliaryData, SetAuxiliaryData).
+// Example: AuxiliaryData oData = poDataset->ReadAuxiliaryData(); oData.SetChannelDescription("near infrared", 4);
 class KRV_DATASOURCES_API AuxiliaryData
 {
 public:
@@ -33,11 +35,14 @@ public:
     AuxiliaryData& operator=(AuxiliaryData&& oOther) noexcept;
     ~AuxiliaryData();
 
+    // References live until the record changes.
     const MetadataMap& GetFileMetadata() const;
     const MetadataMap& GetChanMetadata(unsigned int nChannel) const;
     // Empty when there is no such key.
     std::string GetFileMetadataValue(const std::string& key) const;
     std::string GetChanMetadataValue(const std::string& key, unsigned int nChannel) const;
+
+    // Empty when nobody gave one.
     std::string GetChannelDescription(unsigned int nChannel) const;
     unsigned int GetChannelCount() const;
     // Set by the whole-map setters; assigned by the single-value setters: true after a change, false after none.
@@ -51,8 +56,11 @@ public:
     // A copy without the bookkeeping tags: "_DBLayout" of the file, "_Overview_<n>" and "LAYER_CRC" of channels.
     AuxiliaryData GetCleanedMeta() const;
 
+    // Replaces all tags.
     void SetFileMetadata(const MetadataMap& oMap);
     void SetChanMetadata(const MetadataMap& oMap, unsigned int nChannel);
+
+    // A key that differs from one that is there in letter case alone sets that one's value.
     void SetFileMetadataValue(const std::string& key, const std::string& value);
     void SetChanMetadataValue(const std::string& key, const std::string& value, unsigned int nChannel);
     // Empties the value and keeps the key, and leaves the modified flag, both intended: formats see that the tag was

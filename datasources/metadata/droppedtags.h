@@ -14,6 +14,7 @@ KRV_DATASOURCES_API bool DropStatistics(AuxiliaryData& oRecord);
 // Takes out of `oRecord` the tags whose value is empty there and not in `oBefore`, the record that the file has now:
 // AuxiliaryData removes a tag by emptying its value, so a format calls this before it writes. A tag that was empty
 // before, or is new and empty, is kept. True when there was any.
+// For authors of formats.
 KRV_DATASOURCES_API bool DropRemoved(AuxiliaryData& oRecord, const AuxiliaryData& oBefore);
 
 } // namespace krv::datasources

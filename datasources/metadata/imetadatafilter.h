@@ -9,6 +9,7 @@ namespace krv::qrfutils
 
 // A predicate over one metadata entry. Filters may be evaluated by several threads at once. The order of the virtual
 // operations is public and fixed.
+// Used by AuxiliaryData::GetFilteredMeta, which leaves the selected entries out.
 class KRV_DATASOURCES_API IMetadataFilter
 {
 public:

@@ -7,6 +7,7 @@ namespace krv::qrfutils
 {
 
 // Makes new metadata tags from given ones. The order of the virtual operations is public and fixed.
+// Of tags of a file or of one channel; IAuxDataTfm is of a whole record.
 class KRV_DATASOURCES_API IMetaDataTfm
 {
 public:

@@ -13,13 +13,14 @@ namespace krv::datasources
 
 // The levels of one image, as a dataset keeps them. What is known of each beside its pixels stands in the book of
 // levels (levelbook.h), which a record holds. Belongs to the dataset.
+// For authors of formats: what differs between them is where a level lies, not what a level is. One thread at a time.
 class KRV_DATASOURCES_API LevelStore
 {
 public:
     struct Level
     {
-        unsigned int mnNumber;
-        unsigned int mnWidth;
+        unsigned int mnNumber; // the reduction factor, from 2
+        unsigned int mnWidth;  // pixels, as the file has them
         unsigned int mnHeight;
 
         friend auto operator<=>(const Level&, const Level&) = default;
@@ -41,6 +42,7 @@ public:
     // Takes the images of a level out of the file.
     virtual void DropLevel(unsigned int nLevel, const AuxiliaryData& oBook, const Place& oPlace) = 0;
     // bValid: a level became valid, and is to become invalid with the next change of the image.
+    // Throws what writing the record throws; the book on the disk is as before then.
     virtual void WriteBook(const AuxiliaryData& oBook, bool bValid, const Place& oPlace) = 0;
 
     // The method of levels to come, in capitals; empty as long as nobody said it. Kept between managers.
@@ -52,6 +54,7 @@ private:
 
 // The overview manager over them: what is refused, how large a level is and what the book says of it. A derived class
 // says of whose image the levels are and how their pixels are reached.
+// The operations are IOverviewManager's, with errors in one wording for all formats.
 class KRV_DATASOURCES_API LevelManager : public IOverviewManager
 {
 public:

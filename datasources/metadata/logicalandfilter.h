@@ -15,9 +15,11 @@ class FilterList;
 // Selects an entry when every child does; without children every entry. The children are asked in the order in which
 // they were added, until one declines.
 // A copy shares the list of children with its source: a child added to one is a child of both.
+// The children are the filter's own and go with the last copy. Any thread may evaluate.
 class KRV_DATASOURCES_API LogicalAndFilter : public IMetadataFilter
 {
 public:
+    // Without children.
     LogicalAndFilter();
     // Takes over the filter, also when it throws. Throws DataException for a null filter.
     explicit LogicalAndFilter(IMetadataFilter* poFirst);

@@ -20,10 +20,12 @@ enum eMetadataCategory : unsigned long long
 
 // The functions give new filters owned by the caller, and throw boost::regex_error for patterns that do not compile.
 
+// The value of an entry takes no part in any of them. See RegexMetadataFilter for the syntax.
 KRV_DATASOURCES_API IMetadataFilter* GetMetadataFilterRegEx(const std::string& pattern, bool bCaseInsensitive);
 
 // A filter for whole keys, in which * stands for any text. < and > are taken as word boundaries, intended: stored
 // wildcards rely on the expressions that they become.
+// Example: "STATISTICS_*" selects what statistics programs leave behind.
 KRV_DATASOURCES_API IMetadataFilter* GetMetadataFilter(const std::string& wildcard, bool bCaseInsensitive);
 
 // Selects the tags of the categories whose bits are set, letter case not counted, and always the keys that begin with

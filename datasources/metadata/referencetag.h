@@ -11,6 +11,7 @@ namespace krv::datasources
 
 // The tag of the whole file when the layer is empty and the number 0, else that of the segment. The number is written
 // as a signed one: above 2147483647 it appears negative, intended, and is read back as it was.
+// Example: ("lut.pix", "PCT", 3) gives "gdb:lut.pix/{PCT:3}".
 KRV_DATASOURCES_API std::string BuildRefMetadataTag(const std::string& file, const std::string& layer,
                                                     unsigned int nNumber);
 
@@ -22,6 +23,7 @@ KRV_DATASOURCES_API bool ParseRefMetadataTag(const std::string& tag, std::string
 
 // Whether the file of a tag is this one: the tag names it as the user does, or as it lies beside the one that refers to
 // it.
+// reference: the file that a tag names. Compares names and folders; opens nothing.
 KRV_DATASOURCES_API bool IsReferenceTo(const std::string& reference, const std::string& file);
 
 } // namespace krv::datasources

@@ -10,6 +10,7 @@ namespace krv::qrfutils
 // Selects the entries in whose key a regular expression is found anywhere (anchors decide otherwise); the value takes
 // no part. Perl syntax of Boost.Regex with its default flags: ^ and $ match at line breaks inside a key too, \< and \>
 // are word boundaries. Letters fold by the classic locale. Copies share the compiled expression.
+// Any thread. Example: "^band_[0-9]+$" selects "band_4".
 class KRV_DATASOURCES_API RegexMetadataFilter : public IMetadataFilter
 {
 public:

@@ -19,6 +19,7 @@ using NoDataValue = krv::gobs::SampleValue;
 // Reads a whole text, white space around it aside: decimal and hexadecimal integers and reals, "nan", "inf" and
 // "infinity" in any letter case, with a sign or without. Integers of 64 bits are exact, larger ones become reals.
 // Nothing for any other text: a comma, a unit or a number beyond a double included. No locale takes part.
+// Examples: "-9999", "0x7fff", "1e20", "nan".
 KRV_DATASOURCES_API std::optional<NoDataValue> ParseNoData(const std::string& text);
 
 // The text of a channel's no-data value (from 1) without the white space around it: the channel's own or, when that is
@@ -50,6 +51,7 @@ std::optional<Number> GetNoData(const AuxiliaryData& oMetadata, unsigned int nCh
 
 // As GetNoDataMaskBuilder, from these values: exact for integers of 64 bits, and for NaN. On request NaN samples of the
 // channels that have a value count as no-data beside it.
+// The builder is the caller's. Throws DataException for a text that is no value.
 KRV_DATASOURCES_API krv::gobs::IMaskBuilder*
 GetTypedNoDataMaskBuilder(const AuxiliaryData& oMetadata, krv::gobs::BkgdRule eRule, bool bNaNIsBackground = false);
 

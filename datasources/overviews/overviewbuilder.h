@@ -32,8 +32,10 @@ using krv::gobs::ParseResampling;
 using krv::gobs::Resampling;
 
 // Powers of two, up to the first level with both sides below 256 pixels; none for an image that small.
+// 2, 4, 8, 16, 32, 64 for 10980 x 10980.
 KRV_DATASOURCES_API std::vector<unsigned int> GetDefaultLevels(unsigned int nWidth, unsigned int nHeight);
 
+// The defaults make levels of all of the image, in the calling thread.
 struct OverviewOptions
 {
     // Pixels of the image.
@@ -86,6 +88,10 @@ struct OverviewOptions
 // an exception, the levels are not valid and the file on the disk is as of the last Synchronize.
 // Throws DataException for a writer of bitmaps or of a level and for a dataset without overviews, ParameterException
 // for an unknown method, an empty list and a factor below 2.
+// Example: the usual levels of a file:
+//   BasicWriter oWriter("scene.tif");
+//   BuildOverviews(oWriter, GetDefaultLevels(oWriter.GetWidth(), oWriter.GetHeight()), "AVERAGE");
+//   oWriter.Synchronize();
 KRV_DATASOURCES_API bool BuildOverviews(IRasterWriter& oWriter, const std::vector<unsigned int>& oLevels,
                                         const std::string& method, const OverviewOptions& oOptions = {});
 

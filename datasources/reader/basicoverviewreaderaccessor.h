@@ -14,6 +14,7 @@ class IRasterDataset;
 // The levels of a dataset's own overview facet or, when that has none, of a second opening of the same file through the
 // generic format, which finds levels beside the file. The choice is made once. Copies share what they hold.
 // The dataset outlives the accessor, and the accessor every reader that it makes.
+// BasicReader::GetOverviewReaderAccessor gives one. One thread at a time, that of the dataset.
 class KRV_DATASOURCES_API BasicOverviewReaderAccessor : public IOverviewReaderAccessor
 {
 public:
@@ -27,6 +28,8 @@ public:
     std::vector<unsigned int> GetLevels() const override;
     // Throws OutOfBoundsException for a position outside the list.
     bool IsValid(unsigned int nChannel, unsigned int nLevel) const override;
+
+    // Looks at all channels of the list.
     bool IsLevelValid(unsigned int nLevel) const override;
     // Descriptions are not copied.
     AuxiliaryData GetAuxiliaryData(unsigned int nLevel) override;

@@ -25,6 +25,7 @@ class IRasterIO;
 //
 // All channels have one data type; which lists of channels can be read together is the dataset's to say. Pixels go
 // straight from the format into the raster.
+// Example: BasicReader oReader("scene.tif"); for (auto poTile : RasterRange(oReader)) Use(*poTile);
 class KRV_DATASOURCES_API BasicReader : public RasterAccess
 {
 public:
@@ -50,9 +51,15 @@ public:
 
     ~BasicReader() override;
 
+    // As IRasterReader; the margins of tiles that are read afterwards.
     void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour) override;
     using RasterAccess::ReadRaster;
+
+    // The caller's raster, whose margins may differ from the reader's. Margins that are not read are made as the class
+    // says.
     void ReadRaster(krv::gobs::Raster* poRaster) override;
+
+    // Null for bitmaps and for a reader of a level.
     IOverviewReaderAccessor* GetOverviewReaderAccessor() override;
     // Whether the dataset goes with this reader, from now on.
     void OwnDataset(bool bOwned);

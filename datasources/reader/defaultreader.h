@@ -15,6 +15,7 @@ class IRasterReader;
 // MultiTypeReader. The caller owns the result.
 
 // The dataset stays the caller's and outlives the reader.
+// oChannels: from 1; an empty list is all of them. Throws what the readers' constructors throw.
 KRV_DATASOURCES_API IRasterReader* CreateDefaultReader(IDataset* poDataset, const std::vector<unsigned int>& oChannels);
 
 // The reader owns the dataset that it opens; a fallback opens the file a second time.

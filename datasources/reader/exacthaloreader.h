@@ -14,6 +14,11 @@ class BasicReader;
 // BasicReader makes a margin from the pixels of one tile, this one takes the pixels of the image. Windows may lie
 // partly or wholly outside the image. It has tiles and margins of its own; the source's are not touched. Its levels are
 // read so too, each by a reader with margins and values of its own. One thread at a time.
+// Example: tiles for a filter of 7 x 7 pixels, whose results do not show where tiles meet:
+//   BasicReader oSource("scene.tif");
+//   ExactHaloReader oReader(&oSource, false);
+//   oReader.SetMargins(3, 3, eMirror);
+// Costs the pixels of the margins beside those of the tiles; blocks that neighbours share are decoded once.
 class KRV_DATASOURCES_API ExactHaloReader : public DerivedReader
 {
 public:
@@ -26,6 +31,7 @@ public:
 
     // The values of eConstant, one per channel in the order of the reader, converted to its type; 0 when never set.
     // Throws DataException for another number of values.
+    // They count when SetMargins is told eConstant.
     void SetConstant(const std::vector<double>& oValues);
 
     // Any width with any behaviour. eException: a raster that reaches outside the image throws DataException. eNoData:

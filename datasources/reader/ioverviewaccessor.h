@@ -12,6 +12,7 @@ class IRasterReader;
 
 // The overview levels of a fixed list of channels. A level's number is its reduction factor (2, 4, 8); a channel is a
 // position in the list, from 1, not a channel number of the file. The order of the virtual operations is fixed.
+// One thread at a time, that of the reader or writer that it came from.
 class KRV_DATASOURCES_API IOverviewAccessor
 {
 public:
@@ -30,12 +31,15 @@ public:
     virtual unsigned int GetChanCount() const = 0;
 };
 
+// Example, the coarsest level: poAccessor->CreateRasterReader(poAccessor->GetLevels().back()).
 class KRV_DATASOURCES_API IOverviewReaderAccessor : public IOverviewAccessor
 {
 public:
     ~IOverviewReaderAccessor() override;
 
     // A new reader over a level, owned by the caller; accessor and dataset outlive it.
+    // Throws DataException for a level that is not there. A level that is not up to date is read as it is: ask
+    // IsLevelValid.
     virtual IRasterReader* CreateRasterReader(unsigned int nLevel) = 0;
 };
 

@@ -17,12 +17,16 @@ class RasterIterator;
 
 // The tile grid of a reader or writer. A virtual base, so that a class that is both has one grid.
 // The order of the virtual operations is fixed.
+// RasterRange goes over it in a range loop.
 class KRV_DATASOURCES_API IRasterIterable
 {
 public:
     virtual ~IRasterIterable();
 
     // A new raster of tile nIndex with the current margins, owned by the caller.
+    // Tiles count from 0, row by row from the upper left. Throws OutOfBoundsException for an index beyond the last one,
+    // and what
+    // reading throws.
     virtual krv::gobs::Raster* GetRaster(unsigned int nIndex) = 0;
     // The tile that holds a pixel; End() for a pixel outside the image.
     virtual RasterIterator FindRaster(unsigned int nX, unsigned int nY) = 0;

@@ -23,6 +23,7 @@ class IOverviewReaderAccessor;
 
 // Tile-oriented read access to some channels of an image, all handed out in one data type. One thread at a time.
 // The order of the virtual operations is fixed.
+// Threads use readers of their own, over datasets of their own (ForEachTile makes them), or fronts of a RasterCache.
 class KRV_DATASOURCES_API IRasterReader : public virtual IRasterIterable
 {
 public:

@@ -16,6 +16,7 @@ namespace krv::datasources
 // A facet of readers that know themselves which of their pixels hold data: those that make pixels of other ones, which
 // no record of a dataset describes. Found by dynamic_cast; ReaderValidity asks any reader. The order of the virtual
 // operations is public and fixed.
+// Programs ask ReaderValidity; authors of readers that make pixels give this.
 class KRV_DATASOURCES_API IValidityReader
 {
 public:

@@ -37,6 +37,7 @@ enum eChannelPlacement
 // requested one. Channels of one type are read together; all groups are converted and placed in the result in one pass.
 // A constructor warns when the type does not hold the values of every channel exactly, and when a requested type orders
 // before the promoted one. Readers of the groups stay in step: a setting that some of them refuse changes none.
+// Example: 8U, 16U and 32R as one image of 32R: MultiTypeReader oReader("mixed.tif", {1, 2, 3}, eOwnPlace);
 class KRV_DATASOURCES_API MultiTypeReader : public DerivedReader
 {
 public:
@@ -74,6 +75,8 @@ public:
     AuxiliaryData GetAuxiliaryData() const override;
     IOverviewReaderAccessor* GetOverviewReaderAccessor() override;
     unsigned int GetChansCount() const override;
+
+    // The requested type, else the promoted one.
     const krv::gobs::DataType& GetDataType() const override;
 
     IDataset* GetDataset() const override;

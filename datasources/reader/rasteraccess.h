@@ -18,6 +18,7 @@ class IRasterIO;
 
 // The answers that the standard readers and writers give alike: tile grid, margins, size, type and what the dataset
 // says of itself.
+// Not made by programs: BasicReader and BasicWriter are.
 class KRV_DATASOURCES_API RasterAccess : public IDatasetAccess, public TiledReader
 {
 public:
@@ -29,6 +30,7 @@ public:
     void SetOptimalTileSize() override;
     const std::vector<IChannelInfo*>& GetChannelsInfo() const override;
 
+    // What IRasterReader says of each counts here: who owns results and where they are null.
     IFileFormat* GetFileFormat() const override;
     AuxiliaryData GetAuxiliaryData() const override;
     krv::ogc::cs::ICRS* GetCRS() const override;

@@ -14,9 +14,11 @@ class IRasterIterable;
 
 // A position in a tile grid; the end is the position behind the last tile. Copies are cheap; the reader or writer
 // outlives its iterators.
+// RasterRange is the same with owning pointers and is what new programs take.
 class KRV_DATASOURCES_API RasterIterator
 {
 public:
+    // The first tile. poIterable: borrowed, not null.
     explicit RasterIterator(IRasterIterable* poIterable);
     // An index beyond the last tile is the end.
     RasterIterator(IRasterIterable* poIterable, unsigned int nIndex);
@@ -27,6 +29,7 @@ public:
     // A new raster that the caller deletes; every call reads the tile anew.
     krv::gobs::Raster* operator*() const;
 
+    // Equal at the same tile of the same reader or writer.
     bool operator==(const RasterIterator& oOther) const;
     bool operator!=(const RasterIterator& oOther) const;
 
@@ -38,8 +41,8 @@ public:
     RasterIterator operator--(int);
 
 private:
-    IRasterIterable* mpoIterable;
-    unsigned int mnIndex;
+    IRasterIterable* mpoIterable; // borrowed
+    unsigned int mnIndex;         // of the tile; the number of tiles at the end
 };
 
 } // namespace krv::datasources

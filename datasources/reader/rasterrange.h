@@ -14,6 +14,7 @@ namespace krv::datasources
 // The tiles of a reader or writer for a range loop, each owned by the loop:
 //     for (std::unique_ptr<krv::gobs::Raster> oTile : RasterRange(oReader))
 // Each step reads one tile. The reader outlives the range and keeps its tile size meanwhile.
+// No raster is kept: memory is that of one tile, unless the loop keeps more.
 class RasterRange
 {
 public:
@@ -30,6 +31,7 @@ public:
         explicit Iterator(const RasterIterator& oPosition) : moPosition(oPosition) {}
 
         // Reads the tile. Throws what the reader throws.
+        // Never null.
         value_type operator*() const { return value_type(*moPosition); }
         Iterator& operator++()
         {

@@ -22,6 +22,8 @@ class ValiditySource;
 // IValidityReader, else by all that the dataset behind it says (ValiditySource), of a level too, else by its record
 // alone. Where any channel's no-data value makes a pixel invalid, the record counts beside the reader's own word, which
 // is of all channels. One thread at a time.
+// Example: ReaderValidity oValidity(oReader); const auto poValid = oValidity.Read(*poTile); a null poValid: all are
+// valid.
 class KRV_DATASOURCES_API ReaderValidity
 {
 public:
@@ -38,6 +40,7 @@ public:
     bool IsByValues() const;
     // Fills the raster, and gives a new mask over its full extent whose set bits are valid pixels; null, which means
     // all pixels of the image, when it is not needed.
+    // Throws what reading pixels, mask and alpha throws. The mask is the caller's and stands on nothing.
     std::unique_ptr<krv::gobs::Mask> Read(krv::gobs::Raster& oRaster);
 
 private:

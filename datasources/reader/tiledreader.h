@@ -13,6 +13,7 @@ namespace krv::datasources
 {
 
 // The tile grid and the margins of a reader or writer, and the rasters that they make.
+// A base of readers, not made by programs. IRasterIterable and IRasterReader say what each operation does.
 class KRV_DATASOURCES_API TiledReader : public virtual IRasterReader
 {
 public:
@@ -45,6 +46,7 @@ protected:
     TiledReader(const TiledReader& oOther);
 
     // A grid over an image of a size. Throws DataException, and changes nothing, when there would be too many tiles.
+    // nTileWidth, nTileHeight: pixels; 0 counts as 1.
     void SetGrid(unsigned int nWidth, unsigned int nHeight, unsigned int nTileWidth, unsigned int nTileHeight);
     // Without any check.
     void KeepMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour);

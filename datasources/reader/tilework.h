@@ -16,6 +16,7 @@ namespace krv::datasources
 
 // Makes a reader for one thread, over a dataset of its own, with tile size and margins set; all that it makes are
 // alike. Called by any of the threads, by several at once. The first call is made by the thread that starts the work.
+// Example: [] { return krv::OpenHaloReader("scene.tif", {1}, 8); }
 using ReaderFactory = std::function<std::unique_ptr<IRasterReader>()>;
 
 struct TileJob
@@ -43,6 +44,10 @@ KRV_DATASOURCES_API bool RunTiles(const ReaderFactory& oMakeReader, const TileTa
 // once; oTake(result) gets them one by one in the calling thread. Tiles are read ahead while others are worked on;
 // results that wait are bounded, to two for each thread. False when the progress function stopped it. The first
 // exception in the order of taking ends all and passes. Nothing runs any more when this returns.
+// Example: the mean of an image on all cores:
+//   ThreadPool oPool;
+//   ForEachTile(oMake, [](auto poTile) { return SumOf(*poTile); }, [&](double nSum) { nTotal += nSum; }, {&oPool});
+// oWork may keep or change its tile; it touches nothing that is shared, or locks it.
 template <typename Work, typename Take>
 bool ForEachTile(const ReaderFactory& oMakeReader, Work oWork, Take oTake, const TileJob& oJob = {})
 {

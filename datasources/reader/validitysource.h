@@ -25,6 +25,7 @@ class BitmapBackground;
 
 // The channel that says how opaque pixels are: the first one whose tag "ColorInterp" is "Alpha", in any letter case; 0
 // when there is none.
+// Counted from 1. Only the record is looked at.
 KRV_DATASOURCES_API unsigned int FindAlpha(const AuxiliaryData& oMetadata);
 
 // Which pixels of an image hold data, by everything that the image declares at once: no-data values, a mask bitmap and
@@ -36,6 +37,7 @@ KRV_DATASOURCES_API unsigned int FindAlpha(const AuxiliaryData& oMetadata);
 // them: a channel has no data where its own mask or its no-data value says so, one with neither has data everywhere,
 // and the rule combines all listed ones. Alpha: the channel that FindAlpha names; values above 0 are valid. One thread
 // at a time.
+// ReaderValidity puts it to use for rasters of any reader; this is for rasters that come from elsewhere.
 class KRV_DATASOURCES_API ValiditySource : public krv::gobs::IMaskBuilder
 {
 public:

@@ -14,6 +14,7 @@ class IDataset;
 // caller; null when the source has no image channels. A file named `target` is replaced. Passes what the manager and
 // the datasets throw, and throws DataException for a link to the file itself and for a chain of more than eight links,
 // before anything is made. A failure leaves no new file, and an existing one as it was.
+// No pixel is read: the size of the image does not matter.
 KRV_DATASOURCES_API IDataset* CreateLinkedPix(std::string target, std::string source);
 
 } // namespace krv::datasources

@@ -21,6 +21,8 @@ namespace krv::core
 // models. Any other: the model of that segment, else the one built from the orbit of that segment, else the one built
 // from the dataset's last orbit and that segment. What fails in the first two attempts leads to the next; what the last
 // one throws passes, and so does whatever is no krv::Exception.
+// poDataset: borrowed, not null; the model stands on nothing of it. Null when the dataset has neither models nor
+// orbits.
 KRV_DATASOURCES_API krv::mathmodel::IMathModel* LoadMathModel(krv::datasources::IDataset* poDataset,
                                                               unsigned int nSegment);
 

@@ -42,16 +42,22 @@ namespace krv
 {
 
 // An existing file, as DatasetManager::Open.
+// Throws FileNotFoundException and FileFormatException, whose what() names the file and the cause.
+// Example: const auto poFile = krv::Open("scene.tif", eUpdate);
 KRV_DATASOURCES_API std::unique_ptr<datasources::IDataset> Open(const std::string& fileName,
                                                                 AccessMode eMode = eReadOnly);
 // A new file of a format, as DatasetManager::NewDataset; it has neither size nor channels yet.
 KRV_DATASOURCES_API std::unique_ptr<datasources::IDataset>
+
+// options: KEY=VALUE separated by blanks, such as "COMPRESS=ZSTD".
 Create(const std::string& fileName, const std::string& format, const std::string& options = {});
 
 // Channels of a file or dataset, from 1, as one image; an empty list is all of them. Channels of several types are
 // promoted to one that holds them (CreateDefaultReader). The reader owns the file; the dataset stays the caller's and
 // outlives the reader. Margins at the edges of tiles may be made up: see BasicReader.
 KRV_DATASOURCES_API std::unique_ptr<datasources::IRasterReader>
+
+// Example: const auto poReader = krv::OpenReader("scene.tif", {4, 3, 2});
 OpenReader(const std::string& fileName, const std::vector<unsigned int>& oChannels = {});
 KRV_DATASOURCES_API std::unique_ptr<datasources::IRasterReader>
 OpenReader(datasources::IDataset& oDataset, const std::vector<unsigned int>& oChannels = {});
@@ -63,6 +69,8 @@ OpenHaloReader(const std::string& fileName, const std::vector<unsigned int>& oCh
 
 // Channels of an existing file, to be updated; an empty list is all of them (CreateDefaultWriter).
 KRV_DATASOURCES_API std::unique_ptr<datasources::IRasterWriter>
+
+// What is written is the file's after Synchronize of the writer.
 OpenWriter(const std::string& fileName, const std::vector<unsigned int>& oChannels = {});
 // A new file with an image of that size, type and number of channels, laid out; it is there after Synchronize. A name
 // that is taken is a DataException.
@@ -81,6 +89,7 @@ KRV_DATASOURCES_API std::unique_ptr<gobs::Raster> Read(datasources::IRasterReade
 KRV_DATASOURCES_API std::optional<ogc::cs::PixelWindow> FindWindow(const datasources::IRasterReader& oReader,
                                                                    const ogc::cs::MapBounds& oBounds);
 // A tile, from 0, with the current margins. RasterRange goes through all of them.
+// Throws OutOfBoundsException for an index beyond the last tile.
 KRV_DATASOURCES_API std::unique_ptr<gobs::Raster> ReadTile(datasources::IRasterIterable& oTiles, unsigned int nIndex);
 // A bitmap (from 1) of a dataset; its set bits are the bitmap's. Throws DataException for a dataset without bitmaps.
 KRV_DATASOURCES_API std::unique_ptr<gobs::Mask> ReadBitmap(datasources::IDataset& oDataset, unsigned int nBitmap,

@@ -15,6 +15,7 @@ class IRasterDataset;
 
 // Levels through the dataset's own overview facet. Copies share it. The dataset outlives the accessor, and the accessor
 // every writer that it makes.
+// BasicWriter::GetOverviewWriterAccessor gives one; BuildOverviews does all of the work with it.
 class KRV_DATASOURCES_API BasicOverviewWriterAccessor : public IOverviewWriterAccessor
 {
 public:
@@ -32,6 +33,8 @@ public:
     // Descriptions are not copied.
     AuxiliaryData GetAuxiliaryData(unsigned int nLevel) override;
     unsigned int GetChanCount() const override;
+
+    // A new writer, owned by the caller.
     IRasterWriter* CreateRasterWriter(unsigned int nLevel) override;
     void CreateLevel(unsigned int nLevel) override;
     void SetValid(unsigned int nChannel, unsigned int nLevel, bool bValid) override;
@@ -46,8 +49,8 @@ protected:
 
 private:
     std::shared_ptr<IOverviewManager> mpoManager;
-    IRasterDataset* mpoRasterDataset; // borrowed
-    std::vector<unsigned int> moChannels;
+    IRasterDataset* mpoRasterDataset;     // borrowed
+    std::vector<unsigned int> moChannels; // of the file, from 1
 };
 
 } // namespace krv::datasources

@@ -21,6 +21,11 @@ class IRasterIO;
 // nor type before CreateNewFile: it has no tiles, and whatever needs the image opens it on first use. Nothing is
 // buffered here. A failed opening leaves the writer as it was. What was written is in the file after Synchronize, and
 // not before: a writer that goes without drops it, with a warning, and a new file is not there then.
+// Example: a new file of one channel, tile by tile:
+//   BasicWriter oWriter("new.tif", {1}, "TIF", "COMPRESS=ZSTD");
+//   oWriter.CreateNewFile(RasterInfo(nWidth, nHeight, 1, eDT_32R));
+//   for (std::unique_ptr<Raster> poTile : RasterRange(oWriter)) { Fill(*poTile); oWriter.WriteRaster(poTile.get()); }
+//   oWriter.Synchronize();
 class KRV_DATASOURCES_API BasicWriter : public RasterAccess, public IRasterWriter
 {
 public:
@@ -49,6 +54,8 @@ public:
     BasicWriter(IRasterDataset* poDataset, IRasterIO* poRasterIO, const std::vector<unsigned int>& oChannels);
     ~BasicWriter() override;
 
+    // A tile with its pixels as they are stored, to be changed and written back. What was never written is as the
+    // format fills it, mostly 0.
     krv::gobs::Raster* GetRaster(unsigned int nIndex) override;
     void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour) override;
     void ReadRaster(krv::gobs::Raster* poRaster) override;
@@ -56,6 +63,8 @@ public:
     IOverviewReaderAccessor* GetOverviewReaderAccessor() override;
 
     void WriteRaster(const krv::gobs::Raster* poRaster) override;
+
+    // What IRasterWriter says of each operation counts for these.
     bool FileExists() override;
     void CreateNewFile(const krv::gobs::RasterInfo& oInfo) override;
     void SetAuxiliaryData(const AuxiliaryData& oData) override;

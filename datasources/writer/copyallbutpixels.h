@@ -20,6 +20,7 @@ class IRasterWriter;
 // To be called when the image of a new file is laid out. Both stay the caller's. Returns a line for each thing that the
 // target's format cannot keep, which is no failure: pixels can be written all the same. Throws DataException for images
 // of two sizes, and what reading the source throws.
+// Example: for (const auto& lost : CopyAllButPixels(*poReader, oWriter)) std::cerr << lost << "\n";
 KRV_DATASOURCES_API std::vector<std::string> CopyAllButPixels(const IRasterReader& oSource, IRasterWriter& oTarget);
 
 } // namespace krv::datasources

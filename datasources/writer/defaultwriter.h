@@ -16,6 +16,7 @@ class IRasterWriter;
 // MultiTypeWriter of the promoted type. The caller owns the result.
 
 // The dataset stays the caller's and outlives the writer; an empty list is all channels.
+// oChannels: from 1. Throws what the writers' constructors throw.
 KRV_DATASOURCES_API IRasterWriter* CreateDefaultWriter(IDataset* poDataset, const std::vector<unsigned int>& oChannels);
 
 // Channels of an existing file. The writer owns the dataset that it opens; a fallback opens the file a second time.

@@ -11,6 +11,7 @@ class IRasterWriter;
 
 // Makes and writes the overview levels of a fixed list of channels. A channel is a position in the list, from 1.
 // The order of the virtual operations is fixed.
+// One thread at a time, that of the writer that it came from.
 class KRV_DATASOURCES_API IOverviewWriterAccessor : public IOverviewAccessor
 {
 public:
@@ -19,6 +20,9 @@ public:
     // A new writer over a level, owned by the caller; accessor and dataset outlive it.
     virtual IRasterWriter* CreateRasterWriter(unsigned int nLevel) = 0;
     // Lays out a level for all channels of the file.
+    // Its pixels are 0 and it is not valid until SetValid says so. Throws DataException for a level that exists and for
+    // a dataset
+    // that is not open for updating.
     virtual void CreateLevel(unsigned int nLevel) = 0;
     // Says whether a channel of a level is up to date. Throws OutOfBoundsException for a position outside the list,
     // DataException for an unknown level and a dataset that is not open for updating.

@@ -16,11 +16,13 @@ class IOverviewWriterAccessor;
 // from Synchronize on, which reports every failure: a writer that goes without it drops what came after the last one,
 // and a new file that never got that far. One thread at a time.
 // The order of the virtual operations is fixed.
+// Tiles may be written in any order and more than once; whole blocks of the format, row by row, are quickest.
 class KRV_DATASOURCES_API IRasterWriter : public virtual IRasterIterable, public virtual IRasterReader
 {
 public:
     // Stores the raster's centre at the raster's position; margins never reach the file, and nothing is clipped here.
     // Channel count and type are those of the writer, else DataException before anything is written.
+    // The raster stays the caller's and may be used again at once. Throws IOException when it cannot be written.
     virtual void WriteRaster(const krv::gobs::Raster* poRaster) = 0;
     // Whether there is an image to write to: a file under the name, or a new one from CreateNewFile on.
     virtual bool FileExists() = 0;

@@ -10,10 +10,12 @@ namespace krv::datasources
 
 // Levels of channels of several types, each written as one image of a type. Everything but the writer of a level is as
 // BasicOverviewWriterAccessor has it; its messages are too.
+// MultiTypeWriter::GetOverviewWriterAccessor gives one.
 class KRV_DATASOURCES_API MultiTypeOverviewWriterAccessor : public BasicOverviewWriterAccessor
 {
 public:
     // oTypes: the type of the rasters, and whether samples may change.
+    // poRasterDataset: borrowed; outlives the accessor and its writers.
     MultiTypeOverviewWriterAccessor(IRasterDataset* poRasterDataset, const std::vector<unsigned int>& oChannels,
                                     const MixedTypes& oTypes = {});
     ~MultiTypeOverviewWriterAccessor() override;

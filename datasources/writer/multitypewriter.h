@@ -20,6 +20,7 @@ struct WriterGroup;
 } // namespace detail
 
 // What a writer of channels of several types has to be told, as far as it does not find it.
+// Example: {.moChannels = {eDT_8U, eDT_16U}, .moRaster = eDT_32R} for rasters of 32R into channels of 8 and 16 bits.
 struct MixedTypes
 {
     // Of the channels of a new file, in the order of the writer's list; none: all are of the type that CreateNewFile
@@ -34,8 +35,8 @@ struct MixedTypes
 // A ready-made writer of some channels and their places in the rasters, from 0.
 struct ChannelWriter
 {
-    IRasterWriter* mpoWriter = nullptr;
-    std::vector<unsigned int> moPlaces;
+    IRasterWriter* mpoWriter = nullptr; // taken over
+    std::vector<unsigned int> moPlaces; // as many as the writer has channels
 };
 
 // Writes rasters of one type into channels of several types, and reads them back so: the channels of one type by one
@@ -43,6 +44,7 @@ struct ChannelWriter
 // each channel were changed by that, rounded, saturated or cut, is counted. Nothing else differs from BasicWriter.
 //
 // A failure between the writers of two types leaves one raster half written, as a failure between two rasters does.
+// One pass over the samples of a raster splits and converts them.
 class KRV_DATASOURCES_API MultiTypeWriter : public BasicWriter
 {
 public:

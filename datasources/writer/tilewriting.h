@@ -14,6 +14,10 @@ namespace krv::datasources
 // a file that is laid out; its own blocks fit best into tiles that consist of whole ones. What is written is the same
 // for any number of threads, in the order of the tiles byte for byte. Nothing is synchronised: that is the caller's,
 // unless the answer is false.
+// Example: a filter on all cores into a new file:
+//   ThreadPool oPool;
+//   WriteTiles([] { return OpenHaloReader("scene.tif", {1}, 3); }, &Smooth, *poWriter, {&oPool});
+//   poWriter->Synchronize();
 template <typename Work>
 bool WriteTiles(const ReaderFactory& oMakeReader, Work oWork, IRasterWriter& oWriter, const TileJob& oJob = {})
 {

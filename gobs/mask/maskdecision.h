@@ -11,6 +11,7 @@ namespace krv::gobs
 {
 
 // How the tests of several channels combine into one: is the pixel background?
+// Only listed channels take part. The numbers are public: programs store them.
 enum BkgdRule : int
 {
     eAnyChannel = 0, // at least one listed channel equals its value
@@ -18,6 +19,7 @@ enum BkgdRule : int
 };
 
 // Marks background in pixels of one type: sets the bit of every background pixel, clears that of every other.
+// Made once for a type, used for any number of pixels; any thread.
 class KRV_GOBS_API IMaskDecisionImpl
 {
 public:
@@ -30,6 +32,7 @@ public:
 };
 
 // A rule that says which pixels are background, whatever their type.
+// Any thread. The order of the virtual operations is fixed, here and above.
 class KRV_GOBS_API IMaskDecision
 {
 public:
@@ -43,12 +46,14 @@ public:
 
 // Background by value: oValues[i] is the value of the 1-based channel oChannels[i]. Empty lists mark nothing; channels
 // that a raster lacks take no part. The lists have equal lengths, else DataException.
+// Example: pixels that are 0 in channel 1: MaskDecision(eAnyChannel, {0}, {1}).
 class KRV_GOBS_API MaskDecision : public IMaskDecision
 {
 public:
     MaskDecision(BkgdRule eRule, const std::vector<double>& oValues, const std::vector<unsigned int>& oChannels);
     ~MaskDecision() override;
 
+    // A copy of rule, values and channels.
     IMaskDecision* Clone() const override;
     IMaskDecisionImpl* GetImpl(const DataType& oType, unsigned long long nChannels) const override;
 
@@ -57,12 +62,13 @@ public:
     const std::vector<unsigned int>& GetChannels() const { return moChannels; }
 
 private:
-    BkgdRule meRule;
-    std::vector<double> moValues;
-    std::vector<unsigned int> moChannels;
+    BkgdRule meRule;                      // of several channels
+    std::vector<double> moValues;         // one for each channel of the list
+    std::vector<unsigned int> moChannels; // from 1
 };
 
 // Builds masks from a decision, of which it keeps a copy. A set bit is background.
+// Any thread may build masks of rasters of its own.
 class KRV_GOBS_API MaskDecisionBuilder : public IMaskBuilder
 {
 public:
@@ -79,6 +85,7 @@ private:
 
 // The implementation for one pixel type, owned by the caller. Comparison is made in the pixel's own type: a value that
 // the type cannot hold never matches; a NaN value matches NaN pixels; -0 equals 0.
+// For implementations of IMaskDecision; programs ask a decision.
 KRV_GOBS_API IMaskDecisionImpl* GetMaskDecisionImpl(DataType oType, unsigned long long nChannels, BkgdRule eRule,
                                                     std::vector<double> oValues, std::vector<unsigned int> oChannels);
 

@@ -25,6 +25,7 @@ namespace krv::gobs
 namespace detail
 {
 
+// Nothing for a fraction, for NaN and for what lies outside the type.
 template <class Integer>
 std::optional<Integer> RealToInteger(double nValue)
 {
@@ -39,6 +40,7 @@ std::optional<Integer> RealToInteger(double nValue)
     return static_cast<Integer>(nValue);
 }
 
+// Nothing where no float is meant; NaN and the infinities stay what they are.
 inline std::optional<float> RealToFloat(double nValue)
 {
     using Limits = std::numeric_limits<float>;
@@ -56,6 +58,8 @@ inline std::optional<float> RealToFloat(double nValue)
 } // namespace detail
 
 // The number as a sample, of one part for complex types; nothing when no sample can equal it.
+// Example: ToSample<std::uint8_t>(SampleValue::FromReal(300)) is nothing: no 8-bit pixel is no-data by that number.
+// Constant time; to be asked once for a channel, not for each pixel.
 template <class Sample>
 std::optional<Sample> ToSample(const SampleValue& oValue)
 {
@@ -85,11 +89,13 @@ std::optional<Sample> ToSample(const SampleValue& oValue)
 }
 
 // Compares the samples of a channel with its number, one by one.
+// A plain value; any thread. Example: SampleMatch<float> oMatch(oNoData); oMatch.Matches(nPixel).
 template <class Sample>
 class SampleMatch
 {
 public:
     // No number matches nothing.
+    // A number that no sample equals, such as 300 for 8U, is as good as none.
     explicit SampleMatch(const std::optional<SampleValue>& oNumber)
     {
         const std::optional<Sample> oValue = oNumber ? ToSample<Sample>(*oNumber) : std::nullopt;
@@ -99,6 +105,7 @@ public:
     }
 
     // False when no sample can match.
+    // Worth asking before a loop over pixels: without a number there is nothing to look for.
     bool IsSet() const { return mbSet; }
     // 0 when it is not set.
     Sample GetValue() const { return mnValue; }
@@ -118,13 +125,14 @@ public:
     }
 
 private:
-    Sample mnValue{};
-    bool mbSet = false;
-    bool mbNaN = false;
+    Sample mnValue{};   // as the sample's type has it
+    bool mbSet = false; // there is a number that a sample can equal
+    bool mbNaN = false; // it is NaN
 };
 
 // Writes the value that equals the number into the bytes of one value of a type; false, and nothing written, when there
 // is none. Throws DataException for one-bit values and for a type outside the table.
+// pTarget: as many bytes as one value of the type has, both parts of a complex one; nothing need be aligned.
 KRV_GOBS_API bool StoreSample(const SampleValue& oNumber, const DataType& oType, unsigned char* pTarget);
 
 } // namespace krv::gobs

@@ -11,12 +11,14 @@ namespace krv::gobs
 
 // Sizes and texts of the type codes. The texts are those of messages, of metadata and of the command: U and S are
 // unsigned and signed integers, R is a real, C a complex value of two such parts; the number is the bits of one part.
+// No object is needed. Any thread.
 class DataTypeAdapter
 {
 public:
     // Bytes of one value. Complex of two unsigned 16-bit values has none and fails like an unknown code, intended:
     // callers learn from it that this type has no fixed sample size here. Buffers are sized by BufferBytes instead.
     // Throws ParameterException of type 1 for the parameter "eDataType".
+    // 1 for 8U to 16 for C64R.
     static int ByteSize(NativeDataTypeCode eDataType)
     {
         switch (eDataType)
@@ -48,6 +50,7 @@ public:
     }
 
     // "8U" ... "C64R" for codes 0 to 14. Throws ParameterException for the parameter "eDataType".
+    // DataType::Describe never throws and is the one for messages.
     static std::string TypeToString(NativeDataTypeCode eDataType)
     {
         constexpr const char* TEXTS[] = {"8U",  "8S",  "16U",  "16S",  "32U",  "32S",  "32R", "64U",
@@ -59,6 +62,7 @@ public:
     }
 
     // The counterpart; no value for any other text.
+    // Letter case counts. Example: StringToType("16U") is eDT_16U, StringToType("uint16") nothing.
     static std::optional<NativeDataTypeCode> StringToType(const std::string& text)
     {
         for (int nCode = eDT_8U; nCode <= eDT_C64R; ++nCode)

@@ -24,6 +24,7 @@ namespace krv::gobs
 class Raster;
 
 // The sides of a raster whose margins FillRasterMargins makes.
+// Bits, to be joined.
 enum eMarginSide : unsigned int
 {
     eRightSide = 1,
@@ -37,15 +38,18 @@ enum eMarginSide : unsigned int
 // independently, folded as often as it needs. A flagged side of margin 0 changes nothing. Values of any size, one-bit
 // rasters included. Throws ParameterException for eException, eNoData and unknown behaviours, and when no valid pixel
 // is left.
+// poRaster: the caller's, not null; its centre, or more of it, holds pixels.
 KRV_GOBS_API void FillRasterMargins(Raster* const poRaster, eMarginBehaviour eBehaviour, unsigned int nSides);
 
 // The same for so many columns and rows on each side, whatever the margins of the raster are.
+// nLeft, nRight: columns; nTop, nBottom: rows, of the full extent. Throws as FillRasterMargins.
 KRV_GOBS_API void FillRasterSides(Raster& oRaster, eMarginBehaviour eBehaviour, std::uint64_t nLeft,
                                   std::uint64_t nRight, std::uint64_t nTop, std::uint64_t nBottom,
                                   const krv::Place& oPlace = krv::Place::Current());
 
 // The index that stands for `nIndex` on a line of `nLength` > 0 pixels under a behaviour that copies pixels
 // (eReplicate, eMirror, eMirror101, eWrap). Throws ParameterException for the others.
+// Example for 4 pixels and index -1: eReplicate 0, eMirror 0, eMirror101 1, eWrap 3.
 KRV_GOBS_API long long FoldIndex(long long nIndex, long long nLength, eMarginBehaviour eBehaviour);
 
 } // namespace krv::gobs

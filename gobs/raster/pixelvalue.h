@@ -13,6 +13,7 @@ namespace krv::gobs
 
 // The C++ type of one value of each pixel type, in the order of NativeDataTypeCode; one-bit values, which follow, have
 // none.
+// A type that is added goes behind the others here and in NativeDataTypeCode: the place is the code.
 using PixelValues = std::tuple<std::uint8_t, std::int8_t, std::uint16_t, std::int16_t, std::uint32_t, std::int32_t,
                                float, std::uint64_t, std::int64_t, double, Complex<std::uint16_t>,
                                Complex<std::int16_t>, Complex<std::int32_t>, Complex<float>, Complex<double>>;
@@ -20,6 +21,7 @@ using PixelValues = std::tuple<std::uint8_t, std::int8_t, std::uint16_t, std::in
 namespace detail
 {
 
+// How values of one part and complex ones are told apart; PartOf and PARTS_OF below are the ways to ask.
 template <class Value>
 struct PartsOfValue
 {
@@ -33,6 +35,7 @@ struct PartsOfValue<Complex<PartOfValue>>
     static constexpr unsigned int COUNT = 2;
 };
 
+// Worked out by the compiler.
 template <class Value, class... Values>
 constexpr NativeDataTypeCode FindPixelType(std::type_identity<std::tuple<Values...>>)
 {
@@ -57,22 +60,29 @@ decltype(auto) VisitValue(NativeDataTypeCode eType, const Visitor& oVisitor,
 }
 
 // The type's code. Throws DataException for one-bit values and for a type outside the table.
+// What VisitPixelType switches by.
 KRV_GOBS_API NativeDataTypeCode GetValueType(const DataType& oType, const Place& oPlace);
 
 } // namespace detail
 
 // What a value is made of: the type and the number of its parts, 2 of a complex value and else 1.
+// float for Complex<float> and for float.
 template <class Value>
 using PartOf = typename detail::PartsOfValue<Value>::Part;
+
+// A buffer of n values has n * PARTS_OF<Value> parts.
 template <class Value>
 inline constexpr unsigned int PARTS_OF = detail::PartsOfValue<Value>::COUNT;
 
 // The pixel type whose values are of a C++ type. Does not compile for other types.
+// Example: PIXEL_TYPE_OF<float> is eDT_32R.
 template <class Value>
 inline constexpr NativeDataTypeCode
     PIXEL_TYPE_OF = detail::FindPixelType<std::remove_const_t<Value>>(std::type_identity<PixelValues>());
 
 // The unsigned integer of as many bytes as a value, 1, 2, 4 or 8.
+// For work that moves values without looking at them, and so is compiled once for each size. Not for values of 16
+// bytes.
 template <class Value>
 using BitsOf =
     std::conditional_t<sizeof(Value) == 1, std::uint8_t,
@@ -81,6 +91,9 @@ using BitsOf =
 
 // Calls oVisitor(std::type_identity<Value>()) with the C++ type of one value of a pixel type and gives what that gives,
 // which is of one type for all of them. Throws DataException for one-bit values and for a type outside the table.
+// Example: how many bytes a value has:
+//   VisitPixelType(oType, []<class Value>(std::type_identity<Value>) { return sizeof(Value); });
+// The visitor is compiled for every type; keep what does not depend on the type outside of it.
 template <class Visitor>
 decltype(auto) VisitPixelType(const DataType& oType, const Visitor& oVisitor, const Place& oPlace = Place::Current())
 {
@@ -88,6 +101,7 @@ decltype(auto) VisitPixelType(const DataType& oType, const Visitor& oVisitor, co
 }
 
 // The same with the type of one part, for work that takes complex values apart.
+// For C32R the visitor gets float. Work that must know how many parts there are asks DataType::GetParts.
 template <class Visitor>
 decltype(auto) VisitPartType(const DataType& oType, const Visitor& oVisitor, const Place& oPlace = Place::Current())
 {

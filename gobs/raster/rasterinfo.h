@@ -6,6 +6,7 @@ namespace krv::gobs
 {
 
 // What a raster is: the size of its centre in pixels, its channel count and its type. Margins are not counted.
+// A plain value. Example: RasterInfo(512, 512, 3, eDT_8U) describes 768 KiB of pixels.
 class RasterInfo
 {
 public:
@@ -16,6 +17,7 @@ public:
     {
     }
 
+    // Pixels, as the constructor got them.
     unsigned int GetWidth() const { return mnWidth; }
     unsigned int GetHeight() const { return mnHeight; }
     // Channels, which lie pixel interleaved.
@@ -28,12 +30,13 @@ public:
 private:
     unsigned int mnWidth = 0;
     unsigned int mnHeight = 0;
-    unsigned int mnChannels = 0;
+    unsigned int mnChannels = 0; // of a pixel
     DataType moType;
 };
 
 // Where a raster is: the image position of its centre's first pixel (it may lie outside the image) and the margins
 // around the centre, in pixels, the same left and right, and the same above and below.
+// A plain value. Without margins: RasterContext(nX, nY).
 class RasterContext
 {
 public:
@@ -53,7 +56,7 @@ public:
     friend bool operator==(const RasterContext&, const RasterContext&) = default;
 
 private:
-    int mnX = 0;
+    int mnX = 0; // of the centre, in the image
     int mnY = 0;
     unsigned int mnXMargin = 0;
     unsigned int mnYMargin = 0;

@@ -23,6 +23,9 @@ KRV_GOBS_API void CheckView(const Raster& oRaster, NativeDataTypeCode eViewed, s
 // reads and writes one of C32R. Rows and columns count from the first pixel of the centre, as Raster has it; margins
 // have negative numbers before it and numbers from the width and height on behind. Positions are not checked.
 // Borrows the raster: the raster lives longer, its buffer stays the raster's. As cheap to make as a pointer.
+// Example: sums of the rows of a reader's tile of 32R:
+//   RasterView<const float> oView(*poTile);
+//   for (unsigned int y = 0; y < poTile->GetHeight(); ++y) nSum += std::accumulate(oView.GetRow(y).begin(), ...);
 template <class Value>
 class RasterView
 {
@@ -40,6 +43,7 @@ public:
     }
 
     // The width * channels values of a row between the margins, the channels of a pixel side by side.
+    // The span is valid as long as the raster. Rows from -GetYMargin() to height + GetYMargin() - 1 exist.
     std::span<Value> GetRow(std::ptrdiff_t nY) const
     {
         return GetFullRow(nY).subspan(mnMarginValues, mnRowValues - 2 * mnMarginValues);
@@ -50,6 +54,7 @@ public:
         return {mpFirst + nY * static_cast<std::ptrdiff_t>(mnRowValues), mnRowValues};
     }
     // One value; channels count from 0.
+    // Slower in loops than a row: the place is worked out for each value.
     Value& At(std::ptrdiff_t nX, std::ptrdiff_t nY, unsigned int nChannel) const
     {
         const auto nPixel = static_cast<std::ptrdiff_t>(mnMarginValues) + nX * static_cast<std::ptrdiff_t>(mnChannels);
@@ -57,8 +62,8 @@ public:
     }
 
 private:
-    std::size_t mnChannels;
-    std::size_t mnRowValues;
+    std::size_t mnChannels;     // of a pixel
+    std::size_t mnRowValues;    // of a row with both margins
     std::size_t mnMarginValues; // of one side
     Value* mpFirst;             // of row 0, its left margin included
 };

@@ -10,6 +10,7 @@ namespace krv::gobs
 // How the pixels of a level are made from those of the image. A level of factor f has the size ceil(width / f) by
 // ceil(height / f); pixel i stands for the box [i * f, min((i + 1) * f, size)) on each axis. Integers are rounded half
 // to even. Samples that are not valid take no part.
+// For classes and indices take eNearest or eMode: the mean of two classes is none.
 enum class Resampling
 {
     eNearest,  // the source pixel floor((i + 0.5) * f)
@@ -24,12 +25,15 @@ enum class Resampling
 };
 
 // NEAREST, AVERAGE, MODE, BILINEAR, CUBIC, LANCZOS, RMS, MIN, MAX in any letter case; else ParameterException.
+// Any thread. Blanks are not cut off.
 KRV_GOBS_API Resampling ParseResampling(const std::string& name);
 // The name in capitals.
+// As ParseResampling takes it and as files record it.
 KRV_GOBS_API std::string GetResamplingName(Resampling eMethod);
 
 // Pixels of the level beyond those whose boxes are touched that a changed pixel
 // of the image has a part in.
+// 0 for methods of the box.
 KRV_GOBS_API unsigned int GetKernelRadius(Resampling eMethod);
 
 } // namespace krv::gobs

@@ -6,6 +6,7 @@ namespace krv::gobs
 {
 
 // One rectangle of a tile grid, in whole pixels of the image.
+// A plain value. Nothing is checked.
 class Tile
 {
 public:
@@ -32,6 +33,8 @@ private:
 
 // The grid of tiles over an image: row by row from the top left, numbered from 0; the last column and row are cut at
 // the image's edge. A new grid is one tile of the whole image.
+// A plain value. Example, all tiles of an image with pixels: for (i = 0; i <= oGrid.GetTileRange(); ++i)
+// oGrid.GetTile(i).
 class KRV_GOBS_API TileIterator
 {
 public:
@@ -52,12 +55,12 @@ public:
     Tile GetTile(unsigned int nIndex) const;
 
 private:
-    unsigned int mnWidth;
+    unsigned int mnWidth; // of the image
     unsigned int mnHeight;
-    unsigned int mnTileWidth;
+    unsigned int mnTileWidth; // at least 1
     unsigned int mnTileHeight;
-    unsigned int mnColumns;
-    unsigned int mnRows;
+    unsigned int mnColumns; // of tiles
+    unsigned int mnRows;    // of tiles
 };
 
 } // namespace krv::gobs

@@ -18,8 +18,10 @@ namespace krv::operations
 {
 
 // What the user wants copied.
+// Example: the first three channels as 8 bits: {.sources = {"scene.tif"}, .channels = {1, 2, 3}, .type = eDT_8U}.
 struct CopyRequest
 {
+    // All of one size; their channels follow each other.
     std::vector<std::string> sources;
     std::vector<unsigned int> channels;      // counted from 1 through all files; empty: all
     WindowRequest window;                    // nothing: the whole image
@@ -35,12 +37,15 @@ struct CopyRequest
 };
 
 // How the copy is stored.
+// Example: {"scene.tif", "TIF", "COMPRESS=ZSTD LAYOUT=COG"}.
 struct TargetForm
 {
     std::string name;
     std::string format;  // short name; empty: by the name's extension, else TIF
     std::string options; // as the format takes them
-    bool check = false;  // decode blocks that move as bytes: what is damaged is not passed on
+
+    // Costs the decoding of each block.
+    bool check = false; // decode blocks that move as bytes: what is damaged is not passed on
 };
 
 // Copies channels of one or several files of one size into a new file: pixels, metadata, geocoding, reference system,
@@ -52,6 +57,7 @@ struct TargetForm
 // radar scene as power only pixels, record, place and validity go over. The copy is the same, byte for byte, for any
 // number of threads. Throws RequestException for what makes no sense, DataException when the target is one of the
 // sources or no plain file, and what formats throw.
+// poExecutor: whose threads decode and encode; borrowed, null for none.
 KRV_OPERATIONS_API void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progress& oProgress = {},
                                 krv::threading::IExecutor* poExecutor = nullptr);
 

@@ -9,9 +9,10 @@ namespace krv::operations
 {
 
 // A home of one's own: a folder with a registry, descriptions and plug-ins, that KRVHOME may name.
+// Example: {"/home/me/formats", {"build/myformat.so"}}; programs then run with KRVHOME=/home/me/formats.
 struct HomeRequest
 {
-    std::string folder;
+    std::string folder; // made when it is not there
     // Libraries of plug-ins, each with its description (.xml) beside it under the same name; they are copied.
     std::vector<std::string> plugins;
 };
@@ -26,6 +27,7 @@ struct HomeResult
 // is a home already keeps what it has. Every plug-in that the registry is to list is loaded before, and the registry is
 // replaced as a whole or not at all. Throws RequestException for a plug-in that is none, lacks its description, or
 // offers a format that another one has; IOException for what cannot be written.
+// The installation itself is not touched.
 KRV_OPERATIONS_API HomeResult MakeFormatHome(const HomeRequest& oRequest);
 
 } // namespace krv::operations

@@ -9,6 +9,7 @@ namespace krv::operations
 {
 
 // What was asked for makes no sense by itself or for this file, such as a channel that it does not have.
+// The message tells what to ask for instead where that is known. Nothing was changed.
 class KRV_OPERATIONS_API RequestException : public krv::Exception
 {
 public:
@@ -17,6 +18,7 @@ public:
 };
 
 // The caller's progress function said to stop; the message is "stopped".
+// No failure: programs end quietly when they get it.
 class KRV_OPERATIONS_API StoppedException : public krv::Exception
 {
 public:
@@ -25,6 +27,7 @@ public:
 };
 
 // What the exception that is being handled says by itself, whatever its kind. To be called in a catch block only.
+// It is what(), so that a message that is fixed and says too little comes with its description (Described).
 KRV_OPERATIONS_API std::string CurrentMessage();
 
 } // namespace krv::operations

@@ -13,18 +13,20 @@ namespace krv::operations
 class SourceFile;
 
 // Why channels are shown.
+// For texts that tell a user what is shown.
 enum class DisplayReason
 {
-    eAsked,
+    eAsked,       // the caller named them
     eDefaults,    // the file's display defaults
     eColourTable, // the first has one
     eRoles,       // described as red, green and blue
     eInks,        // cyan, magenta, yellow and black
-    eFirstThree,
-    eFirst
+    eFirstThree,  // nothing is said, and there are three or more
+    eFirst        // nothing is said
 };
 
 // Which channels of a file make a picture, and what belongs to them.
+// Channels count from 1. Made without reading pixels.
 struct DisplayChoice
 {
     std::vector<unsigned int> channels;    // one, or red, green and blue; four inks: cyan, magenta, yellow, black
@@ -35,8 +37,10 @@ struct DisplayChoice
     bool premultiplied = false;            // colours are multiplied by their opacity
     float inkFull = 255;                   // the value of an ink that covers fully
     unsigned int maskBitmap = 0;           // bitmap whose set bits are valid pixels; 0: none
+
+    // Bitmap by channel; set bits are valid pixels of it.
     std::map<unsigned int, unsigned int> channelMasks; // the same of single channels, by their numbers
-    DisplayReason reason = DisplayReason::eFirst;
+    DisplayReason reason = DisplayReason::eFirst;      // of the rule that decided
 };
 
 // In this order: the channels asked for; the file's display defaults; a colour table of the first channel; channels

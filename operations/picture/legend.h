@@ -15,12 +15,14 @@ namespace krv::operations
 
 // A wedge from the value of black to that of white with both numbers and their unit, which may be empty; bInverted:
 // from that of white to that of black.
+// nBlack, nWhite: values, in the unit that is written behind both.
 void AddGreyLegend(double nBlack, double nWhite, const std::string& unit, bool bInverted, Picture& oPicture);
 
 // The names of classes by their values.
 using ClassNames = std::map<unsigned int, std::string>;
 
 // The entries of a table for values that occur, the first 64, as fields with their values and names.
+// Values without a name stand as numbers.
 void AddColourLegend(const krv::gobs::PCT& oTable, const std::set<double>& oValues, const ClassNames& oNames,
                      Picture& oPicture);
 

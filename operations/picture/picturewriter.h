@@ -15,6 +15,8 @@ struct Picture
     unsigned int width = 0;
     unsigned int height = 0;
     unsigned int samples = 0;
+
+    // width * height * samples bytes, samples of a pixel side by side, without padding. Alpha is 255 for opaque.
     std::vector<std::uint8_t> pixels;
 };
 
@@ -27,6 +29,7 @@ KRV_OPERATIONS_API bool IsPictureName(const std::string& fileName);
 
 // The same in the form that the name says; "-" is PNG on the standard output. JPEG has no transparency: such pixels are
 // white. Throws RequestException for another name.
+// Nobody sees half a file: an existing one is replaced when all is written.
 KRV_OPERATIONS_API void WritePicture(const Picture& oPicture, const std::string& fileName);
 
 } // namespace krv::operations

@@ -8,12 +8,13 @@ namespace krv::operations
 {
 
 // How values become grey levels.
+// Percentiles and extremes are those of the reduced picture, valid pixels alone.
 enum class StretchMode
 {
     eAuto,       // 8-bit data as they are when they are colours or use at least half of the range, else by percentiles
     eNone,       // as they are, 0 to 255
     ePercentile, // the 2nd percentile becomes 0, the 98th 255
-    eMinMax
+    eMinMax      // the smallest value becomes 0, the largest 255
 };
 
 // A linear map from values to 0 ... 255.
@@ -23,6 +24,7 @@ struct KRV_OPERATIONS_API Stretch
     float high = 255;
 
     // A map without extent shows everything as middle grey.
+    // Values beyond the ends become 0 or 255. nValue is a number, not NaN.
     std::uint8_t operator()(float nValue) const;
 };
 

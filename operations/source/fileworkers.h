@@ -11,15 +11,19 @@
 namespace krv::operations
 {
 
+// Owns a file that was opened again; only points to the caller's own.
 using FilePointer = krv::OwnedOrBorrowed<const SourceFile>;
 
 // What each thread of a job needs for itself, readers of a file among it. The first worker stands on the file itself,
 // the others each on one of their own, opened again; where that cannot be there is just the first.
+// Example: FileWorkers<Reader> oWorkers(oFile, Make); then FileWorkers<Reader>::Use oWorker(oWorkers) in each task.
+// Worker: not moved and used by one thread at a time, so that it needs no lock.
 template <typename Worker>
 class FileWorkers : public krv::threading::StateStore<Worker>
 {
 public:
     // The file outlives this. What making the first worker throws passes.
+    // Called by any thread, by several at once.
     using MakeWorker = std::function<std::unique_ptr<Worker>(FilePointer poFile)>;
     FileWorkers(const SourceFile& oFile, const MakeWorker& oMake)
         : krv::threading::StateStore<Worker>(

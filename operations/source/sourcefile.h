@@ -33,6 +33,7 @@ KRV_OPERATIONS_API std::string WhyUnreadable(const std::string& file);
 using OptionalNoData = std::optional<krv::datasources::NoDataValue>;
 
 // What a channel's values stand for: value * scale + offset.
+// Example: elevations in centimetres have a scale of 0.01 and an offset of 0.
 struct ValueScale
 {
     double scale = 1;
@@ -43,6 +44,7 @@ struct ValueScale
 };
 
 // A reader and, for a level, what it stands on.
+// Owns all that it holds. Moves; the moved-from one is empty.
 class KRV_OPERATIONS_API LevelReader
 {
 public:
@@ -52,6 +54,7 @@ public:
     LevelReader(LevelReader&&) noexcept;
     ~LevelReader();
 
+    // The level where there is one, else the image. It lives as long as this.
     krv::datasources::IRasterReader& Get() const { return mpoLevel != nullptr ? *mpoLevel : *mpoFull; }
 
     // The coarsest level of the reader that is not smaller than the wanted size, else the reader itself. A level that
@@ -69,8 +72,8 @@ private:
 // Channels of one type, which one reader serves, and where each stands in the list that was grouped.
 struct ChannelGroup
 {
-    std::vector<unsigned int> channels;
-    std::vector<std::size_t> positions;
+    std::vector<unsigned int> channels; // numbers in the file, from 1
+    std::vector<std::size_t> positions; // in the list that was grouped, from 0
 };
 
 // An open file. Readers live at most as long as it.
@@ -91,15 +94,21 @@ public:
     std::shared_ptr<krv::datasources::IRasterReader> ReadAgain(const std::vector<unsigned int>& oChannels,
                                                                bool bUpdated = false) const;
 
+    // As it was given.
     const std::string& GetName() const { return moName; }
+
+    // For what this class has no word for. It goes with this object.
     krv::datasources::IDataset& GetDataset() const { return *mpoDataset; }
     // Null when the file holds no image.
     krv::datasources::IRasterDataset* FindRaster() const { return mpoRaster; }
     // Throws DataException when the file holds no image.
     krv::datasources::IRasterDataset& GetRaster() const;
 
+    // Throws DataException when the file holds no image, as the next one does; channels count from 1.
     unsigned int GetChannelCount() const;
     krv::gobs::DataType GetType(unsigned int nChannel) const;
+
+    // Read when the file was opened.
     const krv::datasources::AuxiliaryData& GetMetadata() const { return moMetadata; }
     // Whether a geocoding that is the identity is a place: only beside a reference system, and where neither ground
     // control points nor a rotated "map info" say another.
@@ -136,8 +145,8 @@ private:
         bool operator==(const Identity&) const = default;
 
         std::uint64_t mnDevice = 0;
-        std::uint64_t mnNode = 0; // 0: it is no file that others can open
-        std::int64_t mnSize = 0;
+        std::uint64_t mnNode = 0;   // 0: it is no file that others can open
+        std::int64_t mnSize = 0;    // bytes
         std::int64_t mnSeconds = 0; // of the last change
         std::int64_t mnNanoseconds = 0;
     };
@@ -146,12 +155,12 @@ private:
     std::unique_ptr<krv::datasources::BasicReader> ReadFull(const std::vector<unsigned int>& oChannels) const;
 
     std::string moName;
-    AccessMode meMode;
+    AccessMode meMode; // as it was opened
     std::optional<std::string> moNoData;
     Identity moIdentity; // as it was just before it was opened
     std::unique_ptr<krv::datasources::IDataset> mpoDataset;
     krv::datasources::IRasterDataset* mpoRaster; // a facet of the dataset
-    krv::datasources::AuxiliaryData moMetadata;
+    krv::datasources::AuxiliaryData moMetadata;  // of the file, read once
 };
 
 } // namespace krv::operations

@@ -20,6 +20,7 @@ class IExecutor;
 namespace krv::operations
 {
 
+// Signed integers, unsigned ones and reals, by the channel's type.
 using ExactNumber = std::variant<std::int64_t, std::uint64_t, double>;
 
 // What a channel's values are like. A value counts once: as no-data, as masked (its pixel is not valid by something
@@ -30,22 +31,24 @@ struct ChannelStatistics
 {
     unsigned int number = 0; // of the channel, from 1; 0 when they are of no file
     krv::gobs::DataType type;
-    std::string noDataText; // as the file has it; empty when it has none
-    bool alpha = false;     // it says which pixels are valid and has no statistics of its own
-    std::uint64_t valid = 0;
-    std::uint64_t noData = 0;
-    std::uint64_t masked = 0;
+    std::string noDataText;        // as the file has it; empty when it has none
+    bool alpha = false;            // it says which pixels are valid and has no statistics of its own
+    std::uint64_t valid = 0;       // with noData, masked, nan and infinite all values of the channel
+    std::uint64_t noData = 0;      // equal to the no-data value
+    std::uint64_t masked = 0;      // not valid by mask, alpha or the other channels
     std::uint64_t transparent = 0; // those of the masked ones that alpha leaves out
-    std::uint64_t nan = 0;
-    std::uint64_t infinite = 0;
+    std::uint64_t nan = 0;         // of reals; 0 for integers
+    std::uint64_t infinite = 0;    // of reals
     std::optional<ExactNumber> minimum;
     std::optional<ExactNumber> maximum;
+
+    // Of complex channels: of the magnitudes.
     std::optional<double> mean;
-    std::optional<double> deviation;
+    std::optional<double> deviation; // 0 for a single value
     // On request. Bins of equal width from low to high; those of integers begin half a step below the minimum and end
     // half a step above the maximum.
     std::vector<std::uint64_t> histogram;
-    double histogramLow = 0;
+    double histogramLow = 0; // a value of the channel, scaled when that was asked for
     double histogramHigh = 0;
     // On request, one value for each share: the smallest value that so many hundredths of the valid values do not
     // exceed. Exact for integers whose extremes are less than 65536 apart, else to a 65536th of that distance.
@@ -53,15 +56,17 @@ struct ChannelStatistics
 };
 
 // The bins in which values are counted: value v falls into bin (v - low) * perValue, cut off.
+// Values below the first bin and above the last count there.
 struct HistogramBins
 {
-    double low = 0;
-    double perValue = 1;
+    double low = 0;      // where the first bin begins
+    double perValue = 1; // bins for one step of the value
     std::size_t count = 0;
 };
 
 // Gathers the statistics of one channel. Exact sums for integers; for reals each run of some thousand values is summed
 // around its own mean and the runs are merged in extended precision, so that a large offset costs no digits.
+// For programs that have pixels without a file. Memory does not grow with the number of values.
 class KRV_OPERATIONS_API StatisticsGatherer
 {
 public:
@@ -81,9 +86,11 @@ public:
     virtual void Merge(const StatisticsGatherer& oOther) = 0;
 
     // Throws DataException for a type outside the table.
+    // oNoData: nothing where no value is no-data.
     static std::unique_ptr<StatisticsGatherer> Make(const krv::gobs::DataType& oType, const OptionalNoData& oNoData);
 };
 
+// Example: {.channels = {1}, .percentiles = {2, 98}}.
 struct StatisticsRequest
 {
     std::vector<unsigned int> channels; // empty: all
@@ -96,6 +103,7 @@ struct StatisticsRequest
 
 // One result for each channel that is asked for, in that order. Throws RequestException for a channel that is not
 // there. The results are the same for any number of threads.
+// poExecutor: whose threads decode and count; borrowed, null for none.
 KRV_OPERATIONS_API std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile,
                                                                     const StatisticsRequest& oRequest,
                                                                     const Progress& oProgress = {},

@@ -16,14 +16,17 @@ namespace krv::operations
 
 // The grid that a file is to be brought into, in its own reference system. What is left open is the file's own: its
 // outline, and the size of its pixels. At most one of a resolution and a size.
+// Example: {.source = "scene.tif", .like = "dem.tif"} makes pixels that lie on those of the other file.
 struct WarpRequest
 {
     std::string source;
-    std::vector<unsigned int> channels;          // empty: all
-    std::string like;                            // a file whose grid it is; nothing else is given then
-    std::optional<MapBounds> bounds;             // of the outer edges; pixels at the far edges may reach beyond
-    std::vector<double> resolution;              // map units of a pixel, of a column and of a row
-    std::vector<unsigned int> size;              // columns and rows
+    std::vector<unsigned int> channels; // empty: all
+    std::string like;                   // a file whose grid it is; nothing else is given then
+    std::optional<MapBounds> bounds;    // of the outer edges; pixels at the far edges may reach beyond
+    std::vector<double> resolution;     // map units of a pixel, of a column and of a row
+    std::vector<unsigned int> size;     // columns and rows
+
+    // Nearest, bilinear, cubic, lanczos, average or mode.
     std::optional<krv::gobs::Resampling> method; // none: mode for indices of a colour table, else bilinear
     std::optional<double> noData;                // of pixels that have no source; none: the file's own
     unsigned int degree = 0;                     // of the polynomial through control points; 0: by their number
@@ -31,9 +34,10 @@ struct WarpRequest
 };
 
 // What came of it.
+// What was chosen where the request left it open.
 struct WarpResult
 {
-    unsigned int width = 0;
+    unsigned int width = 0; // of the new file
     unsigned int height = 0;
     krv::ogc::cs::GeocodingInfo geocoding;
     krv::gobs::Resampling method = krv::gobs::Resampling::eNearest;
@@ -50,6 +54,7 @@ struct WarpResult
 // mask says which pixels are valid where no value does. Each channel keeps its type. The new file as with Convert, the
 // same for any number of threads. Throws RequestException for what makes no sense and for a file in another reference
 // system.
+// Memory: windows of the source and the tiles of the threads, whatever the size of both images.
 KRV_OPERATIONS_API WarpResult Warp(const WarpRequest& oRequest, const TargetForm& oForm, const Progress& oProgress = {},
                                    krv::threading::IExecutor* poExecutor = nullptr);
 

@@ -24,6 +24,8 @@ namespace krv::plugins::support
 // Synchronize and Close make what was written the file's and report failure; a dataset that is destroyed without leaves
 // an existing file as of the last Synchronize, warns of what is lost, and removes a new file that was never
 // synchronised.
+// Example, a format that only reads: the constructor reads the header, makes an IBlockSource and calls SetImage; that
+// is all.
 class Dataset : public krv::datasources::IDataset,
                 public krv::datasources::IRasterDataset,
                 public krv::datasources::INewFileDataset,
@@ -43,35 +45,54 @@ public:
     // Closes the dataset and removes the file, with the levels, masks and tags beside it.
     krv::datasources::FileAccessState Delete() override;
     // A new file exists from Create on, though it has its name only after Synchronize.
+    // A file that was opened exists as long as the system finds it under its name.
     bool Exists() const override;
     std::string GetName() override { return moName; }
     // An empty record with as many channels as the image has.
     krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
     void WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override;
+
+    // Null unless overridden.
     krv::ogc::cs::ICRS* ReadCRS() const override;
+
+    // Refused unless overridden; so are the other changes below.
     void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;
+
+    // False unless overridden.
     bool IsLinked() const override;
+
+    // Stores what the writer and the files beside hold. Throws what storing throws; nothing of it is lost then.
     void Synchronize() override;
     bool IsOpen() const override { return mbOpen; }
     // An override calls this one. I/O objects keep the image alive.
     void Close() override;
 
+    // A new BlockRasterIO over the image, owned by the caller.
     krv::datasources::IRasterIO* GetRasterIO(const std::vector<unsigned int>& oChannels) override;
     void AddNewChannel(const krv::gobs::RasterInfo& oInfo) override;
     void DeleteChannel(unsigned int nChannel) override;
     void Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes) override;
     void Create(const krv::gobs::RasterInfo& oInfo) override;
+
+    // Throws DataException before SetImage and after Close, as the next three do.
     unsigned int GetWidth() const override;
     unsigned int GetHeight() const override;
     unsigned int GetChanCount() const override;
+
+    // Of the plane of the channel: its type, and the native one where the layout says it.
     krv::datasources::IChannelInfo* GetChannelInfo(unsigned int nChannel) const override;
+
+    // Null unless overridden; so is the next.
     krv::datasources::IHistoryIO* GetHistoryIO(unsigned int nChannel) override;
     krv::datasources::IOverviewManager* GetOverviewManager() override;
+
+    // Readable; writable and updatable with a writer.
     krv::datasources::AccessCapabilities GetRasterCapabilities() override;
 
     void KeepExisting() override;
 
     // Nothing before there is an image.
+    // What a format asks of them is said by GetNeeds.
     std::vector<krv::datasources::Sidecar> ListSidecars() override;
     void BeginSidecars() override;
     void WriteTagsBeside(const krv::datasources::AuxiliaryData& oData) override;
@@ -79,6 +100,7 @@ public:
     void WriteGeocodingBeside(const krv::ogc::cs::GeocodingInfo& oInfo) override;
 
     // For what stands on the dataset.
+    // As it was given to the constructor, or as the writer has it.
     const std::string& GetFileName() const { return moName; }
     // Throws the DataException of a change to a file that is only read or has no image yet. pWhat: as for Refuse.
     void CheckWriting(const char* pWhat, const Place& oPlace) const;
@@ -107,6 +129,7 @@ protected:
     const std::shared_ptr<BlockImage>& GetImage(const Place& oPlace = Place::Current()) const;
     const ImageLayout& GetLayout(const Place& oPlace = Place::Current()) const;
     // For further images of the dataset: levels, bitmaps.
+    // Never null.
     const std::shared_ptr<BlockCache>& GetCache() const { return mpoCache; }
     void CheckOpen(const Place& oPlace = Place::Current()) const;
     // For the format to call before pixels of the image change: what lies beside says nothing of their values any more.
@@ -123,12 +146,12 @@ private:
     void CheckLacking(bool bLacking, const char* pWhat, const Place& oPlace) const;
 
     std::string moName;
-    krv::datasources::IFileFormat* mpoFormat;
-    std::shared_ptr<BlockCache> mpoCache;
-    std::shared_ptr<BlockImage> mpoImage;
-    mutable std::unique_ptr<Sidecars> mpoSidecars;
-    std::shared_ptr<FileWriter> mpoWriter; // null when the file is only read
-    bool mbSidecarsWritten = false;
+    krv::datasources::IFileFormat* mpoFormat;      // the builder's
+    std::shared_ptr<BlockCache> mpoCache;          // for all images of the dataset
+    std::shared_ptr<BlockImage> mpoImage;          // null before SetImage
+    mutable std::unique_ptr<Sidecars> mpoSidecars; // made when it is asked for
+    std::shared_ptr<FileWriter> mpoWriter;         // null when the file is only read
+    bool mbSidecarsWritten = false;                // what lies beside may change, though the file itself may not
     bool mbOpen = true;
     int mnExceptions = std::uncaught_exceptions();
 };

@@ -11,16 +11,19 @@ namespace krv::plugins::support
 {
 
 // The levels of one image, as a format has them.
+// A format with levels derives from it and says where the images of a level are.
 class LevelStore : public krv::datasources::LevelStore
 {
 public:
     ~LevelStore() override;
 
     // The pixels of a level that there is.
+    // Opened once and shared by all I/O objects over the level. Throws what reading the file throws.
     virtual std::shared_ptr<BlockImage> OpenLevel(unsigned int nLevel) = 0;
 };
 
 // The overview manager over them.
+// GetOverviewManager of a dataset gives a new one to the caller.
 class OverviewManager : public krv::datasources::LevelManager
 {
 public:

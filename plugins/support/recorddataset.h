@@ -15,21 +15,29 @@ namespace krv::plugins::support
 // A dataset whose metadata, reference system, geocoding and directory of levels are one record: a format says where
 // that is kept, as text or in another form, and where the pixels are. Files beside add what the record lacks. Levels
 // can be made as long as the file is written.
+// For formats of a header and pixels. One with metadata in another form derives from Dataset.
 class RecordDataset : public Dataset,
                       public krv::datasources::IGeocodedDataset,
                       public krv::datasources::IPlaceRemoval,
                       protected LevelStore
 {
 public:
+    // The record with what files beside add; a copy.
     krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
     // Which levels are valid is not taken from the record: their manager keeps that.
     void WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override;
     krv::ogc::cs::ICRS* ReadCRS() const override;
     void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;
+
+    // Valid until it is set anew.
     const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override;
     void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) override;
+
+    // A file beside may say another afterwards.
     void RemoveCRS() override;
     void RemoveGeocoding() override;
+
+    // A new one, owned by the caller.
     krv::datasources::IOverviewManager* GetOverviewManager() override;
 
 protected:
@@ -38,6 +46,8 @@ protected:
     Sidecars::Needs GetNeeds() const override;
     // What the file says when it is opened, or an empty one of so many channels as it has.
     void ShowRecord(RecordText oRecord);
+
+    // As it will be stored, changes included.
     const RecordText& GetRecord() const { return moRecord; }
     // Channels came or went: their tags, by the numbers of those that they were, 0 for new ones, whose levels are not
     // valid.
@@ -51,6 +61,7 @@ protected:
     void ForgetOpened() { moOpened.clear(); }
 
     // Makes a record the file's. Throws DataException when that cannot be, and changes nothing.
+    // Called for each change of the record, within the operation that changes it.
     virtual void StoreRecord(const RecordText& oRecord) const = 0;
     // Room for a level that is not there, by the number that will find it.
     virtual std::uint64_t MakeRoom(unsigned int nLevel) = 0;
@@ -68,7 +79,7 @@ private:
 
     void Change(RecordText oRecord) const;
 
-    mutable RecordText moRecord;
+    mutable RecordText moRecord;      // as the file is to hold it
     mutable bool mbForgotten = false; // what was known of the pixels before the last change
     bool mbForgottenNamed = false;    // while the file had its name
     mutable std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding; // the record's or that of a file beside

@@ -4,6 +4,6 @@
 // (0.5, 0.5) its centre; y grows downwards. At global scope, like all of the toolkit's geometry.
 struct GDBVertex
 {
-    double x = 0;
-    double y = 0;
+    double x = 0; // columns
+    double y = 0; // rows
 };

@@ -21,10 +21,13 @@ class EdgeBatch;
 // so every row has an even number of crossings. Rows are signed 32-bit numbers; what lies beyond them, and on the
 // largest of them, is left out. Vertices with a coordinate that is not a finite number are left out as if they had not
 // been given. Memory is that of the edges, however many rows they cross. A plain value.
+// Any number of threads may ask one object that nobody changes.
+// Example: for each pair of GetScanline(r), pixels whose centre column c + 0.5 lies between both are inside.
 class KRV_TOOLKIT_API GGLPolyRaster
 {
 public:
     // An edge with the rows whose centres it crosses.
+    // A plain value. Edges that cross no row's centre are none.
     struct Edge
     {
         Edge() {} // not cleared: there are many
@@ -33,12 +36,13 @@ public:
         {
         }
 
-        int firstRow;
-        int lastRow;
+        int firstRow; // the row of its upper end
+        int lastRow;  // at or below firstRow
         double x;     // on firstRow
         double slope; // x per row
 
         // The crossing of one of these rows. An edge of enormous extent may give an infinity, never NaN.
+        // nRow: from firstRow to lastRow; other rows give a number without a meaning.
         double At(int nRow) const { return x + static_cast<double>(std::int64_t{nRow} - firstRow) * slope; }
     };
 
@@ -47,6 +51,7 @@ public:
     // pnRingStarts: the index of the first vertex of each ring, ascending; a ring ends where the next begins. Only rows
     // from 0 to nRows - 1 are kept; all of them when nRows is below 1. Throws krv::DataException for a negative count,
     // a missing array and starts that are out of order or outside the vertices.
+    // The arrays are borrowed for the call alone.
     GGLPolyRaster(const GDBVertex* poVertices, int nVertices, const int* pnRingStarts, int nRings, int nRows);
     GGLPolyRaster(const GGLPolyRaster&);
     GGLPolyRaster(GGLPolyRaster&&) noexcept;
@@ -55,28 +60,35 @@ public:
     ~GGLPolyRaster();
 
     // Whether any row has a crossing.
+    // False for a polygon between two lines of centres, which fills nothing.
     bool IsNonEmpty() const { return !moEdges.empty(); }
     // The first and last row with crossings; 0 and -1 without any.
     int GetFirstRow() const { return moExtent.firstRow; }
     int GetLastRow() const { return moExtent.lastRow; }
     // All crossings lie between these, rounding aside.
+    // Columns, continuous; the largest and the lowest double for a polygon without crossings.
     double GetLeft() const { return moExtent.left; }
     double GetRight() const { return moExtent.right; }
 
     // The crossings of a row, ascending, in pairs that enclose what is inside; empty for a row without any. Takes time
     // in proportion to their number, but for the logarithms of search and sort.
+    // Crossings are continuous columns: pixel c is inside when c + 0.5 lies from the first of a pair to the second.
     std::vector<double> GetScanline(int nRow) const;
     // The same into a vector that is used again.
+    // What it held before is gone; its memory is kept, so that a loop over rows allocates nothing.
     void GetScanline(int nRow, std::vector<double>& oCrossings) const;
 
     // All edges, by their first row.
     const std::vector<Edge>& GetEdges() const { return moEdges; }
     // The number of edges that begin above a row.
+    // With FindReaching the way to walk rows upwards from any row, without a search for each.
     std::size_t CountEdgesAbove(int nRow) const;
     // Replaces the list by those of the first nEdges edges that reach down to a row.
+    // nEdges: as CountEdgesAbove gives it. The pointers are valid until this object changes.
     void FindReaching(int nRow, std::size_t nEdges, std::vector<const Edge*>& oEdges) const;
 
 private:
+    // The rows of interest, both ends among them.
     struct RowLimits
     {
         std::int64_t first = std::numeric_limits<int>::min();
@@ -99,8 +111,8 @@ private:
     void Finish();
     void SortEdges();
 
-    std::vector<Edge> moEdges;
+    std::vector<Edge> moEdges; // by firstRow
     // For every bundle of edges the last row of them all; then for every bundle of these, and so on.
     std::vector<std::vector<int>> moLastRows;
-    Extent moExtent;
+    Extent moExtent; // of all edges together
 };

@@ -18,13 +18,16 @@ public:
     GGLShape& operator=(GGLShape&&) noexcept;
     ~GGLShape();
 
+    // Fewer than three vertices enclose nothing but are kept. The vertices are copied.
+    // Example: a square of 10 pixels: oShape.AddRing({{0, 0}, {10, 0}, {10, 10}, {0, 10}});
     void AddRing(const std::vector<GDBVertex>& oVertices);
 
     // The vertices of all rings, one ring after the other, and the index of the first vertex of each ring.
+    // Valid until a ring is added. Without rings both are empty.
     const std::vector<GDBVertex>& GetVertices() const { return moVertices; }
     const std::vector<std::size_t>& GetRingStarts() const { return moRingStarts; }
 
 private:
-    std::vector<GDBVertex> moVertices;
-    std::vector<std::size_t> moRingStarts;
+    std::vector<GDBVertex> moVertices;     // of all rings
+    std::vector<std::size_t> moRingStarts; // as many as there are rings
 };

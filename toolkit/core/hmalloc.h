@@ -13,10 +13,13 @@
 KRV_TOOLKIT_API void* HMalloc(std::size_t nBytes);
 
 // Null is allowed.
+// pBlock: of HMalloc; it may not be used afterwards.
 KRV_TOOLKIT_API void HFree(void* pBlock) noexcept;
 
 // Gives all kept blocks back to the system; the peak is counted anew from what is live.
+// For programs that wait long after a job. What is in use stays.
 KRV_TOOLKIT_API void HTrim() noexcept;
 
 // Bytes kept for reuse at this moment.
+// For logs and tests; other threads may change it at once.
 KRV_TOOLKIT_API std::size_t HKeptBytes() noexcept;

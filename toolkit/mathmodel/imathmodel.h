@@ -12,6 +12,10 @@ namespace krv::mathmodel
 // the right, rows downwards. Ground positions are geographic on WGS 84: longitude (east positive) and latitude (north
 // positive) in degrees, height in metres above the ellipsoid. Positions outside the image are allowed as far as the
 // model reaches. Immutable once built; one thread at a time, a clone may go to another thread.
+// Example: the place of the image's centre at 250 m:
+//   double nLongitude, nLatitude;
+//   poModel->ImageToGround(nWidth / 2.0, nHeight / 2.0, 250, nLongitude, nLatitude);
+// The order of the virtual operations is public and fixed.
 class KRV_TOOLKIT_API IMathModel
 {
 public:
@@ -31,6 +35,7 @@ public:
     virtual IMathModel* Clone() const = 0;
 
     // What kind of model it is, such as "RPC".
+    // For people and logs. Never empty.
     virtual std::string GetName() const = 0;
 
     // The model of a reduced image of the same scene: a new object that the caller owns. The ratios are the width and

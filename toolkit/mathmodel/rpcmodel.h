@@ -15,9 +15,11 @@ namespace krv::mathmodel
 class KRV_TOOLKIT_API RpcModel final : public IMathModel
 {
 public:
+    // Scales span the ground that the provider fitted: 1 is its border, and a half of it beyond is still served.
     static constexpr double FITTED_RANGE = 1.5;
 
     // Throws DataException for numbers that are no model.
+    // The coefficients are copied.
     explicit RpcModel(const RpcCoefficients& oCoefficients);
     ~RpcModel() override;
 
@@ -36,11 +38,13 @@ public:
 
     // Many points at once; each array holds nCount numbers, results may replace arguments. A point that is not reached
     // gets NaN for both of its results. Returns how many are reached. Throws as for one point, with undefined results.
+    // Quicker than single calls.
     std::size_t ImageToGround(std::size_t nCount, const double* pColumns, const double* pRows, const double* pHeights,
                               double* pLongitudes, double* pLatitudes) const;
     std::size_t GroundToImage(std::size_t nCount, const double* pLongitudes, const double* pLatitudes,
                               const double* pHeights, double* pColumns, double* pRows) const;
 
+    // As the constructor got them.
     const RpcCoefficients& GetCoefficients() const { return moCoefficients; }
 
 private:

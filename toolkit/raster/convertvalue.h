@@ -13,6 +13,7 @@ namespace krv::raster
 namespace detail
 {
 
+// From an integer to another: what is below the target's range becomes its least value, what is above its largest.
 template <typename TTarget, typename TSource>
 [[gnu::always_inline]] inline TTarget ClampInteger(TSource nValue)
 {
@@ -32,6 +33,7 @@ template <typename TTarget, typename TSource>
     return static_cast<TTarget>(nValue);
 }
 
+// From a real to an integer: rounded half to even, as programs leave the processor's mode; NaN becomes 0.
 template <typename TTarget, typename TSource>
 [[gnu::always_inline]] inline TTarget RoundInteger(TSource nValue)
 {
@@ -53,6 +55,8 @@ template <typename TTarget, typename TSource>
 
 // The number as a sample of a type of one part. Integers saturate; reals go to integers rounded half to even and
 // saturated, NaN to 0; integers go to reals rounded to nearest; what is beyond 32R becomes infinite.
+// Examples: 300 as 8U is 255, -1 as 16U is 0, 2.5 as 16S is 2 and 3.5 is 4, 1e39 as 32R is infinite.
+// Never throws and has no undefined value. Complex values go part by part, by the caller.
 template <typename TTarget, typename TSource>
 [[gnu::always_inline]] inline TTarget ConvertValue(TSource nValue)
 {

@@ -12,6 +12,7 @@ namespace krv::raster
 
 // A pixel-interleaved buffer without padding that a Splitter makes, and the channels of the source, from 0, that it
 // takes, in its order.
+// Repeats and any order of channels are allowed.
 struct SplitTarget
 {
     BufferType meType = eBT_8U;
@@ -21,6 +22,7 @@ struct SplitTarget
 // Makes several pixel-interleaved buffers of the channels of one, each of a type of its own, converted by the rules of
 // CopyData: the counterpart of Merger. The source is read once, a block at a time that stays in the nearest caches.
 // What depends on the types and places alone is worked out once, by the constructor. One thread at a time.
+// Example: RGB and infrared of 16 bits apart: Splitter(eBT_16U, 4, {{eBT_8U, {0, 1, 2}}, {eBT_16U, {3}}}).
 class KRV_TOOLKIT_API Splitter
 {
 public:
@@ -36,6 +38,7 @@ public:
     // pChanged: null, or one number for each channel of each target, in their order, to which that of the values is
     // added that are not what they were: rounded, saturated, NaN made 0, or complex with an imaginary part that is
     // dropped. Types that hold every value of the source's cost nothing to count.
+    // Throws nothing but std::bad_alloc.
     void Run(const unsigned char* pSource, const std::vector<unsigned char*>& oTargets, std::uint64_t nPixels,
              std::uint64_t* pChanged = nullptr);
 

@@ -10,6 +10,8 @@ namespace krv::simd
 
 // Words from and to memory of any alignment.
 
+// Files keep their numbers at any address; a cast of the pointer would be undefined. Compiles to one instruction.
+// T: a type that can be copied by its bytes. sizeof(T) bytes are read; whether they are there is the caller's to check.
 template <typename T>
 inline T Load(const unsigned char* source)
 {
@@ -18,12 +20,14 @@ inline T Load(const unsigned char* source)
     return nValue;
 }
 
+// The counterpart: sizeof(T) bytes are written.
 template <typename T>
 inline void Store(unsigned char* destination, T nValue)
 {
     std::memcpy(destination, &nValue, sizeof(T));
 }
 
+// The bytes of a number in the other order. One byte stays as it is, so that templates need no case for it.
 inline std::uint8_t Swap(std::uint8_t nValue)
 {
     return nValue;
@@ -41,20 +45,25 @@ inline std::uint64_t Swap(std::uint64_t nValue)
     return __builtin_bswap64(nValue);
 }
 
+// Known when compiling, so that the branches below cost nothing.
 constexpr bool LITTLE = std::endian::native == std::endian::little;
 
+// A number as a big-endian file holds it ("MM" of TIFF, the boxes of JPEG 2000). T: an unsigned integer of 1 to 8
+// bytes.
 template <typename T>
 inline T LoadBigEndian(const unsigned char* source)
 {
     return LITTLE ? Swap(Load<T>(source)) : Load<T>(source);
 }
 
+// The same of little-endian files ("II" of TIFF, native files).
 template <typename T>
 inline T LoadLittleEndian(const unsigned char* source)
 {
     return LITTLE ? Load<T>(source) : Swap(Load<T>(source));
 }
 
+// Signed numbers and reals are taken as the unsigned integer of their bits (std::bit_cast) by the caller.
 template <typename T>
 inline void StoreBigEndian(unsigned char* destination, T nValue)
 {
@@ -68,6 +77,7 @@ inline void StoreLittleEndian(unsigned char* destination, T nValue)
 }
 
 // Sixteen bytes at once. The two places may overlap: all are read before any is written.
+// Faster than memcpy of fewer bytes where 16 may be touched: rows with that much room behind them.
 inline void Copy16(unsigned char* destination, const unsigned char* source)
 {
     unsigned char aBytes[16];

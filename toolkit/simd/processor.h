@@ -7,6 +7,7 @@ namespace krv::simd
 // loops, and the one of the options that the build compiles them with (krv_vector_options). For sources that choose,
 // which are compiled for the least processor themselves.
 
+// Asked once for a whole run of work, not in a loop: the answer never changes while the process lives.
 inline bool RunsAvx2()
 {
 #if defined(__x86_64__)
@@ -18,6 +19,7 @@ inline bool RunsAvx2()
 
 // Shuffles across a whole vector (VBMI) came with the second generation of these processors, as did GFNI; the first
 // slows down on long vectors and stays with the shorter ones.
+// False wherever RunsAvx2 is false. Results do not depend on either: every loop gives the same bits on every processor.
 inline bool RunsAvx512()
 {
 #if defined(__x86_64__)

@@ -9,9 +9,13 @@ namespace krv::threading
 
 // Threads that a program lends to the library, which starts none of its own. Whoever wants work on several cores hands
 // it one of these; without one it is done by the thread that asks for it.
+// A program with threads of its own makes a small class of it; others take ThreadPool. The order of the operations is
+// public
+// and fixed.
 class KRV_TOOLKIT_API IExecutor
 {
 public:
+    // After it no task begins any more.
     virtual ~IExecutor();
 
     // How many tasks may run at one time, beside what the thread that asks does itself. 0: none ever.

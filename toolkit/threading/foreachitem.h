@@ -17,6 +17,11 @@ namespace krv::threading
 // oTake(result), in the thread that owns the group. Results that wait are bounded by GetAhead and nMostAhead. The first
 // exception in the order of taking ends all and passes, so that in the order of the items it is the same one for any
 // number of threads; work that has not begun is dropped, nothing runs any more when this returns.
+// oWork: called once for each item, by several threads at once, in any order. Its result is moved to oTake.
+// oTake: called by one thread alone, in the order of the items with eAsAdded, as they come with eAsDone.
+// Memory: as many results as are ahead, at least one. Everything that both use outlives the call.
+// Example: sums of tiles, the same for any number of threads:
+//   ForEachItem(oGroup, nTiles, [&](std::uint64_t i) { return SumOf(i); }, [&](double nSum) { nTotal += nSum; });
 template <typename Work, typename Take>
 void ForEachItem(TaskGroup& oGroup, std::uint64_t nItems, Work oWork, Take oTake,
                  TaskOrder eOrder = TaskOrder::eAsAdded, std::size_t nMostAhead = SIZE_MAX)

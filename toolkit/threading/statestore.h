@@ -12,6 +12,8 @@ namespace krv::threading
 
 // What a task needs for itself while it runs, such as a reader of its own: taken when it begins, made when none is
 // free, given back at its end. There are never more than tasks that run at one time.
+// Any thread may use a store. States are of one kind: which one a task gets does not matter.
+// Example: StateStore<Decoder>::Use oDecoder(oDecoders); oDecoder->Run(...);
 template <typename T>
 class StateStore
 {
@@ -20,11 +22,14 @@ public:
     // There is at least one then, added before. What it throws passes to the task.
     using Make = std::function<std::unique_ptr<T>()>;
 
+    // Nothing is made here. oMake may be called by several threads at once.
     explicit StateStore(Make oMake) : moMake(std::move(oMake)) {}
 
+    // A state that was made elsewhere, such as the one that the file was opened with. Not null.
     void Add(std::unique_ptr<T> poState) { Give(std::move(poState)); }
 
     // One state, for as long as this lives.
+    // It is taken by the constructor, which may wait, and given back by the destructor. One thread at a time uses it.
     class Use
     {
     public:
@@ -33,6 +38,7 @@ public:
         Use(const Use&) = delete;
         Use& operator=(const Use&) = delete;
 
+        // The state belongs to the store: nobody keeps a pointer to it beyond the life of this object.
         T& operator*() const { return *mpoState; }
         T* operator->() const { return mpoState.get(); }
 
@@ -69,10 +75,10 @@ private:
     }
 
     Make moMake;
-    std::mutex moMutex; // guards what follows
-    std::condition_variable moGiven;
-    std::vector<std::unique_ptr<T>> moFree;
-    bool mbComplete = false;
+    std::mutex moMutex;                     // guards what follows
+    std::condition_variable moGiven;        // told when a state comes back
+    std::vector<std::unique_ptr<T>> moFree; // the one given back last is taken first: its memory is warm
+    bool mbComplete = false;                // moMake gave null once: it is not asked again by those who wait
 };
 
 } // namespace krv::threading

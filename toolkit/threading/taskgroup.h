@@ -15,6 +15,7 @@ class TaskLine;
 
 // The tasks of one job, run by an executor's threads and by the thread that owns the group, which never waits for a
 // task that nobody has begun: an executor that is busy with something else costs time alone.
+// One thread makes it, adds to its lines and takes from them: the owner. Only the tasks run elsewhere.
 class KRV_TOOLKIT_API TaskGroup
 {
 public:
@@ -23,13 +24,16 @@ public:
     // it throws ends the waiting.
     explicit TaskGroup(IExecutor* poExecutor, std::function<void()> oIdle = {});
     // The lines are gone by then.
+    // Tasks that run belong to lines, which waited for them.
     ~TaskGroup();
     TaskGroup(const TaskGroup&) = delete;
     TaskGroup& operator=(const TaskGroup&) = delete;
 
     // The owning thread among them.
+    // 1 without an executor, or with one that lends no threads.
     unsigned int GetThreadCount() const { return mnThreads + 1; }
     // How many tasks of a line keep all threads busy.
+    // Adding more does no harm but to memory: nothing bounds a line by itself.
     std::size_t GetAhead() const { return mnThreads == 0 ? 1 : 2 * (std::size_t{mnThreads} + 1); }
 
 private:
@@ -40,13 +44,14 @@ private:
     IExecutor* mpoExecutor; // borrowed
     unsigned int mnThreads;
     std::function<void()> moIdle;
-    std::shared_ptr<State> mpoState;
+    std::shared_ptr<State> mpoState; // shared with tasks that executors hold on to
 };
 
+// Whether results are taken in the order in which their tasks were added, or as soon as any is done.
 enum class TaskOrder
 {
-    eAsAdded,
-    eAsDone
+    eAsAdded, // the result does not depend on the number of threads
+    eAsDone   // for work whose order does not matter
 };
 
 // Tasks whose results are taken one after the other by the thread that owns the group, whatever thread runs which and
@@ -61,11 +66,17 @@ public:
     TaskLine& operator=(const TaskLine&) = delete;
 
     // oWork: run by any thread. oTake: run by the owning thread afterwards; may be empty.
+    // Never waits. What oWork throws is kept and thrown by TakeNext; oTake is not called then.
     void Add(std::function<void()> oWork, std::function<void()> oTake);
     // Tasks that have not been taken.
+    // Those that run or are done count too.
     std::size_t GetCount() const { return moEntries.size(); }
     // Waits for the next one in the line's order and takes it, or throws what it threw. There is one.
+    // Runs tasks of the group itself while the next one is not done. Calling it without a task left is an error of the
+    // caller.
     void TakeNext();
+
+    // As TakeNext until none is left. An exception leaves the others in the line, to be dropped with it.
     void TakeAll();
 
 private:
@@ -81,7 +92,7 @@ private:
 
     TaskGroup& moGroup;
     TaskOrder meOrder;
-    Entries moEntries;
+    Entries moEntries; // in the order of Add
 };
 
 } // namespace krv::threading

@@ -9,6 +9,8 @@ namespace krv::threading
 
 // A ready-made executor for programs: it is the program that starts these threads, by making the object; the library
 // makes none. They block all signals, which stay with the program's other threads.
+// Example: krv::threading::ThreadPool oPool; then &oPool is the executor that readers, writers and jobs ask for.
+// Several jobs may share one pool. It outlives all of them.
 class KRV_TOOLKIT_API ThreadPool : public IExecutor
 {
 public:
@@ -24,6 +26,8 @@ public:
     static unsigned int CountProcessors();
 
     unsigned int GetThreadCount() const override;
+
+    // Tasks begin in the order in which they came. Any thread.
     void Run(std::function<void()> oTask) override;
 
 private:

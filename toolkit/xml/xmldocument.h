@@ -31,6 +31,8 @@ public:
 
     // Null only after the document was moved from.
     xalanc::XalanDocument* Get() const;
+
+    // What the evaluator of XPaths asks for; it belongs to the document.
     xalanc::DOMSupport& GetSupport() const;
 
 private:
@@ -45,7 +47,10 @@ private:
 // Whatever is wrong (no such file, not a regular file, not readable, malformed, beyond the limits of limits.h, holding
 // a document type declaration) is thrown as a class below xercesc::SAXParseException and std::exception. Nothing
 // outside the document is ever read, and nothing is printed.
+// Example: const Document oDocument = ParseFile("format.xml");
 KRV_TOOLKIT_API Document ParseFile(const std::string& fileName);
+
+// poData: nBytes bytes, borrowed for the call.
 KRV_TOOLKIT_API Document ParseMemory(const void* poData, std::size_t nBytes, const std::string& name);
 
 } // namespace krv::xml

@@ -13,9 +13,10 @@ namespace krv::xml
 
 // One element of a small document, for those who need no XPath. All texts are UTF-8. Names keep their prefixes, the
 // declarations of which are attributes; comments and processing instructions are left out. A plain value.
+// Example: for (const Element& oBand : ParseTree(text.data(), text.size()).children) ...
 struct KRV_TOOLKIT_API Element
 {
-    std::string name;
+    std::string name; // with its prefix, such as "gml:pos"
     std::vector<std::pair<std::string, std::string>>
         attributes;   // in the order of the text, declarations of prefixes first
     std::string text; // all text directly inside, white space kept
@@ -29,6 +30,7 @@ struct KRV_TOOLKIT_API Element
     ~Element();
 
     // The value of the attribute; null when it is absent. Valid until the element changes.
+    // Names are compared byte by byte, prefixes included. The first counts where one stands twice.
     const std::string* FindAttribute(std::string_view attribute) const;
 
     // The first child of that name; null when there is none. Valid until the element changes.
@@ -40,6 +42,7 @@ struct KRV_TOOLKIT_API Element
 // the messages. Throws krv::DataException naming the cause for anything malformed, any text that is not valid in its
 // encoding (UTF-8 unless UTF-16 or one with a byte for each character is declared), document type declarations and
 // anything beyond limits.h; std::bad_alloc; no exception of another kind, no output.
+// Any thread. Takes time and memory linear in the document's size.
 KRV_TOOLKIT_API Element ParseTree(const char* poData, std::size_t nBytes, const std::string& name = "XML text");
 
 } // namespace krv::xml

@@ -16,6 +16,7 @@
 class KRV_TOOLKIT_API KRV_XMLUtil
 {
 public:
+    // Programs mostly take an XmlSession instead.
     static void Initialize();
 
     // One call for each Initialize; a call too many does nothing.
@@ -34,6 +35,8 @@ namespace krv::xml
 {
 
 // Keeps XML support started while it lives.
+// Such objects may be nested and may live in several threads: each is one Initialize and one Terminate.
+// Throws what Initialize throws.
 class KRV_TOOLKIT_API XmlSession
 {
 public:

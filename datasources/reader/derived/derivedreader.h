@@ -16,6 +16,9 @@ class ReaderValidity;
 // The base of readers over another reader, their source. It has tiles and margins of its own; everything else is the
 // source's answer until a derived class overrides it: type, channels and record where they differ. A derived class says
 // in any case how a raster is filled, by ReadRaster, and how a reader of a level is wrapped. One thread at a time.
+// A program that shows pixels otherwise (a filter, an index of two channels) derives from this;
+// docs/readers-over-readers.md
+// tells what else to think of.
 class KRV_DATASOURCES_API DerivedReader : public TiledReader, public IDatasetAccess, public IValidityReader
 {
 public:
@@ -54,6 +57,7 @@ protected:
     DerivedReader(const DerivedReader& oOther);
 
     // Takes the source's size and its tile.
+    // Called by the constructor of the derived class. Not null.
     void SetSource(OwnedOrBorrowed<IRasterReader> oSource);
     IRasterReader& GetSource() const { return **mpoSource; }
     // Whether the source goes with this reader.

@@ -18,6 +18,7 @@ class IDataset;
 // in another file, which is looked for as named and beside the dataset's; else the one that belongs to it by the
 // dataset's own word. A reference that leads nowhere is a warning. Null when there is none. Passes what the dataset
 // throws.
+// The table is the caller's and stands on nothing: the dataset may go.
 KRV_DATASOURCES_API std::unique_ptr<krv::gobs::PCT> FindPCT(IDataset& oDataset, unsigned int nChannel);
 
 } // namespace krv::datasources

@@ -30,6 +30,7 @@ enum eColourAlpha
 // IValidityReader, which answers as the source would, and in the alpha channel, which is 0 where a pixel is not valid.
 // The record keeps the file's tags without what colours make untrue, and the description of the channel, in channel 1.
 // It shows no dataset: the values of its pixels are not those of one.
+// Example: PCTRasterReader oColours("classes.tif"); its tiles have three channels of 8U, or four.
 class KRV_DATASOURCES_API PCTRasterReader : public DerivedReader
 {
 public:
@@ -48,6 +49,7 @@ public:
     PCTRasterReader& operator=(const PCTRasterReader&) = delete;
     ~PCTRasterReader() override;
 
+    // The copy that this reader keeps.
     const krv::gobs::PCT& GetTable() const;
 
     using DerivedReader::ReadRaster;
@@ -56,6 +58,8 @@ public:
     AuxiliaryData GetAuxiliaryData() const override;
     IOverviewReaderAccessor* GetOverviewReaderAccessor() override;
     unsigned int GetChansCount() const override;
+
+    // 8U.
     const krv::gobs::DataType& GetDataType() const override;
     IDataset* GetDataset() const override { return nullptr; }
     const std::vector<unsigned int>& GetChannels() const override;

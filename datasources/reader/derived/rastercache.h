@@ -9,6 +9,7 @@
 namespace krv::datasources
 {
 
+// The defaults suit windows that a viewer asks for.
 struct CacheOptions
 {
     // Pixels of a cached tile; 0: the source's tile.
@@ -23,6 +24,7 @@ struct CacheOptions
 };
 
 // Numbers of a cache since it was made, all of its fronts and levels together.
+// Hits over hits and misses is the share of tiles that cost nothing.
 struct CacheStatistics
 {
     std::uint64_t mnHits = 0;   // tiles that were there, or that another thread was making
@@ -39,6 +41,9 @@ struct CacheStatistics
 // each thread uses a front of its own. The source is read under a lock, or, when a factory makes one for each front,
 // without. A tile that several threads want is read once; who waits gets the exception of a failed reading, which
 // leaves nothing behind.
+// Example: four threads over one transformed image, each with its own source:
+//   RasterCache oCache([] { return MakeTransformed("scene.tif"); });
+//   RasterCache oFront(oCache);   // in each thread
 class KRV_DATASOURCES_API RasterCache : public DerivedReader
 {
 public:
@@ -82,6 +87,8 @@ public:
     // Forget tiles of pixels that changed: those of a rectangle of the image, and all levels; or everything. Any front.
     void Invalidate(unsigned int nX, unsigned int nY, unsigned int nWidth, unsigned int nHeight);
     void InvalidateAll();
+
+    // A copy of one moment. Any front.
     CacheStatistics GetStatistics() const;
 
 private:

@@ -29,6 +29,7 @@ enum ePowerSource
     eAmplitudes = 4          // real: the sum of squares
 };
 
+// Example: HH and VV of a scene of four channels: {.moChannels = {1, 4}}.
 struct PowerRequest
 {
     ePowerSource meSource = ePowerByRecord;
@@ -49,6 +50,7 @@ struct PowerRequest
 // functions are the ways. Levels are those of the source that hold power: of intensities and matrices all, of
 // scattering elements and amplitudes those made by NEAREST or RMS, since the power of a mean is not the mean of power.
 // It shows no dataset: the values of its pixels are not those of one.
+// Example: TotalPowerRasterReader oPower("slc.tif"); decibels are 10 * log10 of its values.
 class KRV_DATASOURCES_API TotalPowerRasterReader : public DerivedReader
 {
 public:

@@ -17,10 +17,11 @@ namespace krv::datasources
 {
 
 // How an image is made of another one.
+// Example: {.mnWidth = 500, .mnHeight = 500, .meMethod = krv::gobs::Resampling::eBilinear}.
 struct TransformRequest
 {
-    unsigned int mnWidth = 0; // of the result
-    unsigned int mnHeight = 0;
+    unsigned int mnWidth = 0;  // of the result
+    unsigned int mnHeight = 0; // rows of the result
     // eNearest, eBilinear, eCubic, eLanczos, eAverage or eMode, see InterpolationRule.
     krv::gobs::Resampling meMethod = krv::gobs::Resampling::eNearest;
     // What pixels without a source become, one for all channels or one for each; none: the source's no-data value,
@@ -48,6 +49,9 @@ struct TransformRequest
 //
 // Margins of any width and behaviour are those of the whole result extended beyond its borders. There are no levels:
 // another request gives a smaller image. It shows no dataset: its pixels are not those of one.
+// Example: half of an image's size:
+//   const auto poMap = std::make_shared<AffineMap>(GeocodingInfo(0, 2, 0, 0, 0, 2));
+//   TransformRasterReader oHalf(poReader, poMap, {poReader->GetWidth() / 2, poReader->GetHeight() / 2}, false);
 class KRV_DATASOURCES_API TransformRasterReader : public DerivedReader
 {
 public:

@@ -9,6 +9,7 @@ namespace krv::plugins::codec
 {
 
 // Deflate in its zlib wrapping.
+// TIFF's compressions 8 and 32946, and native files.
 class DeflateDecoder : public BlockDecoder
 {
 public:
@@ -21,6 +22,7 @@ private:
     Handle<libdeflate_decompressor> mpoDecompressor{nullptr, nullptr}; // made when it is wanted
 };
 
+// Higher levels cost the encoder alone: decoding is as quick for all of them.
 class DeflateEncoder : public BlockEncoder
 {
 public:
@@ -31,6 +33,8 @@ public:
     explicit DeflateEncoder(int nLevel = DEFAULT_LEVEL);
 
     std::size_t GetBound(std::size_t nInput) const override;
+
+    // Whole blocks in one call; the stream ends with its check sum.
     std::size_t Encode(const unsigned char* input, std::size_t nInput, unsigned char* output,
                        std::size_t nOutput) override;
 

@@ -8,6 +8,7 @@ namespace krv::plugins::codec
 {
 
 // LZ4 blocks, without a frame around them.
+// Files name it LZ4.
 class Lz4Decoder : public BlockDecoder
 {
 public:
@@ -16,6 +17,7 @@ public:
     Result Decode(const unsigned char* input, std::size_t nInput, unsigned char* output, std::size_t nOutput) override;
 };
 
+// Higher levels cost the encoder alone.
 class Lz4Encoder : public BlockEncoder
 {
 public:
@@ -31,7 +33,7 @@ public:
 
 private:
     int mnLevel;
-    std::unique_ptr<unsigned char[]> mpoState;
+    std::unique_ptr<unsigned char[]> mpoState; // the codec's working memory
 };
 
 } // namespace krv::plugins::codec

@@ -11,9 +11,11 @@ namespace krv::plugins::codec
 
 // LZW as TIFF has it: codes of 9 to 12 bits, clear code 256, end code 257, most significant bit first, the width
 // growing one code early; and its first edition, least significant bit first and without the early growth.
+// TIFF's compression 5. GIF has another form, which is not served here.
 class LzwDecoder : public BlockDecoder
 {
 public:
+    // Throws std::bad_alloc. The table is made once and used for all blocks.
     LzwDecoder();
     ~LzwDecoder() override;
 
@@ -27,9 +29,10 @@ public:
 
 private:
     struct Table;
-    std::unique_ptr<Table> mpoTable;
+    std::unique_ptr<Table> mpoTable; // of codes, used again for each block
 };
 
+// The newer edition unless TakeForm is told the older one.
 class LzwEncoder : public BlockEncoder
 {
 public:
@@ -42,6 +45,8 @@ public:
     // An image has the first edition of the coding in all of its blocks or in none: readers take what the first one is
     // for all.
     std::size_t GetFormBytes() const override { return 2; }
+
+    // oLike: GetFormBytes bytes of a block of the image; none for the newer edition.
     void TakeForm(std::span<const unsigned char> oLike) override;
 
 private:
@@ -50,7 +55,7 @@ private:
 
     struct Table;
     std::unique_ptr<Table> mpoTable;
-    bool mbOld = false;
+    bool mbOld = false; // the first edition is written
 };
 
 } // namespace krv::plugins::codec

@@ -6,6 +6,7 @@ namespace krv::plugins::codec
 {
 
 // PackBits: runs and stretches of bytes, each behind its length.
+// TIFF's compression 32773.
 class PackBitsDecoder : public BlockDecoder
 {
 public:

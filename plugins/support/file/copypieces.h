@@ -10,15 +10,17 @@ namespace krv::plugins::support
 {
 
 // Bytes that go from one file to another.
+// A plain value.
 struct CopiedPiece
 {
-    std::uint64_t mnFrom = 0;
-    std::uint64_t mnTo = 0;
+    std::uint64_t mnFrom = 0; // offset in the source
+    std::uint64_t mnTo = 0;   // offset in the target
     std::uint64_t mnBytes = 0;
 };
 
 // Copies pieces in few and large calls: those that lie side by side in both files go together. In the target a single
 // byte between two pieces is filling, which may be written too. Throws what reading and writing throw.
+// oScratch: working memory, a few mebibytes. The order of the pieces does not matter.
 void CopyPieces(const File& oFrom, File& oTo, std::vector<CopiedPiece> oPieces, Scratch& oScratch);
 
 } // namespace krv::plugins::support

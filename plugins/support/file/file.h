@@ -19,9 +19,11 @@ namespace krv::plugins::support
 // written by one object at a time, of all programs; readers are not held up. Every
 // failure is an exception that names the file and the cause, a file that became shorter meanwhile included. A file may
 // be read by several threads.
+// Example: File oFile("a.tif", File::Mode::eRead); unsigned char aHeader[8]; oFile.Read(0, aHeader, sizeof aHeader);
 class File
 {
 public:
+    // eUpdate and eCreate lock the file against other writers for as long as the object lives, or until EndWriting.
     enum class Mode
     {
         eRead,   // an existing file
@@ -40,20 +42,25 @@ public:
     // What transfers take in place of a Place, which costs memory and is made only when something is thrown.
     using Location = std::source_location;
 
+    // As it was given, or as ShowAs says.
     const std::string& GetName() const { return moName; }
     // The size at the moment of opening; writing beyond the end raises it.
+    // Offsets from files are compared with this before anything is read or allocated.
     std::uint64_t GetSize() const { return mnSize; }
 
     // What the file was when it was opened for reading; nothing when others that open it may not go by that: it is
     // written here, or was changed less than two seconds before.
     const std::optional<krv::cache::FileStamp>& GetStamp() const { return moStamp; }
     // Whether it is still that.
+    // One call of the system.
     bool IsAsOpened() const;
 
     // Reads exactly nBytes. Throws IOException when the file ends before.
+    // nOffset: bytes from the beginning. Several threads may read one object.
     void Read(std::uint64_t nOffset, void* pTarget, std::size_t nBytes, Location oLocation = Location::current()) const;
 
     // Reads up to nBytes and returns how many there were: fewer only at the end of the file.
+    // Throws IOException for failures other than the end of the file.
     std::size_t ReadUpTo(std::uint64_t nOffset, void* pTarget, std::size_t nBytes,
                          Location oLocation = Location::current()) const;
 
@@ -63,8 +70,12 @@ public:
                   unsigned char* pTarget, std::size_t nPitch, Scratch& oScratch,
                   Location oLocation = Location::current()) const;
 
+    // Throws IOException when the disk is full, the file may not be written or it is not open for it. May write a part
+    // before.
     void Write(std::uint64_t nOffset, const void* pSource, std::size_t nBytes,
                Location oLocation = Location::current());
+
+    // Rows of nRowBytes, nPitch bytes apart at pSource, are written nStoredPitch bytes apart; what lies between stays.
     void WriteRows(std::uint64_t nOffset, std::size_t nStoredPitch, std::size_t nRowBytes, std::size_t nRows,
                    const unsigned char* pSource, std::size_t nPitch, Location oLocation = Location::current());
 
@@ -75,6 +86,7 @@ public:
 
     // Makes sure that what was written reaches the disk. Throws when the file lost its name meanwhile: nobody would
     // find it again.
+    // Takes as long as the disk needs, so that formats call it for whole states and not for blocks.
     void Flush(const Place& oPlace = Place::Current());
     // Has the system begin with what was written there: Flush has the less to wait for.
     void BeginFlush(std::uint64_t nOffset, std::uint64_t nBytes) const noexcept;
@@ -107,15 +119,15 @@ private:
     bool CanSeeLocks() const;
 
     std::string moName;
-    std::string moPath;
-    int mnDescriptor = -1;
-    std::uint64_t mnSize = 0;
+    std::string moPath;       // the file's, whatever messages call it
+    int mnDescriptor = -1;    // owned
+    std::uint64_t mnSize = 0; // bytes
     std::uint64_t mnDevice = 0;
     std::uint64_t mnInode = 0;
     std::optional<krv::cache::FileStamp> moStamp;
     mutable std::atomic<bool> mbSlow{false};
-    bool mbLinked = false; // some file systems do not count names
-    std::optional<std::uint64_t> moHeld;
+    bool mbLinked = false;               // some file systems do not count names
+    std::optional<std::uint64_t> moHeld; // the root that is held
     mutable std::optional<bool> moSeesLocks;
 };
 

@@ -8,6 +8,7 @@ namespace krv::plugins::support
 {
 
 // Whole numbers of 1 to 8 bytes in the byte order of a file.
+// pBytes: nBytes bytes, 1 to 8, at any address. The number is not negative: signs are the caller's.
 inline std::uint64_t ReadNumber(const unsigned char* pBytes, std::size_t nBytes, bool bBigEndian)
 {
     std::uint64_t nValue = 0;
@@ -16,6 +17,7 @@ inline std::uint64_t ReadNumber(const unsigned char* pBytes, std::size_t nBytes,
     return nValue;
 }
 
+// Adds nBytes bytes behind the others; what of nValue does not fit is cut off.
 inline void AppendNumber(std::vector<unsigned char>& oBytes, std::uint64_t nValue, std::size_t nBytes, bool bBigEndian)
 {
     for (std::size_t nAt = 0; nAt < nBytes; ++nAt)

@@ -17,12 +17,13 @@ namespace krv::plugins::support
 // somebody else's again.
 struct RoomRecord
 {
-    std::uint64_t mnFileBytes = 0;
+    std::uint64_t mnFileBytes = 0; // the size of the file that it is of
     std::vector<Extent> moForeign; // ascending, apart from each other
 
     // More parts than this become one.
     static constexpr std::size_t MAXIMUM_FOREIGN = 64;
 
+    // Of the record with so many parts.
     static std::size_t GetBytes(std::size_t nForeign);
     // The bytes that go behind the root at nRoot.
     std::vector<unsigned char> Make(std::uint64_t nRoot) const;

@@ -7,10 +7,12 @@ namespace krv::plugins::support
 {
 
 // Working memory that grows on demand, is kept for the next use and never zeroed.
+// One thread at a time. Not for memory whose size a file says and nobody checked.
 class Scratch
 {
 public:
     // At least nBytes bytes; what an earlier call gave is lost when the memory has to grow.
+    // Throws std::bad_alloc. Valid until the next call of either operation.
     unsigned char* Get(std::size_t nBytes)
     {
         if (nBytes > mnBytes)
@@ -24,6 +26,7 @@ public:
     }
 
     // Gives memory above a limit back, so that one large block does not stay for good.
+    // nLimit: bytes. Memory at or below it stays.
     void Shrink(std::size_t nLimit)
     {
         if (mnBytes > nLimit)

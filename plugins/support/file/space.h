@@ -15,10 +15,11 @@ namespace krv::plugins::support
 
 // A piece of a file. The generation tells in which state it was taken: 0 for what was there before the file was opened,
 // n for what the n-th state since then brings.
+// A plain value.
 struct Extent
 {
-    std::uint64_t mnOffset = 0;
-    std::uint64_t mnBytes = 0;
+    std::uint64_t mnOffset = 0; // from the beginning of the file
+    std::uint64_t mnBytes = 0;  // its length
     std::uint64_t mnGeneration = 0;
 
     std::uint64_t GetEnd() const { return mnOffset + mnBytes; }
@@ -28,6 +29,7 @@ struct Extent
 // a change is written beside it, and one small write, of where the root lies, makes the new state the file's. What a
 // new state gives up may be taken again when no reader holds a state that needs it; states are known by their roots,
 // which are places in the file or other numbers that no two states have at one time.
+// Book-keeping in memory alone: nothing is read or written here. One thread at a time.
 class Space
 {
 public:
@@ -50,11 +52,14 @@ public:
     // The same in free room before nEnd alone; no value when there is none.
     std::optional<Extent> AllocateBefore(std::uint64_t nBytes, std::uint64_t nEnd);
     // The first part of a fresh piece stays in use when nKept is above 0.
+    // oExtent: as Allocate gave it, or a part of the file as it was opened.
     void Release(const Extent& oExtent, std::uint64_t nKept = 0);
 
     // An operation of several steps: what it gives up stays taken until it is adopted; when it is undone, what it took
     // is free again and what it gave up is not.
     void Begin() { mbOperation = true; }
+
+    // What the operation did counts; what it gave up is given up.
     void Adopt();
     void Undo();
 
@@ -70,6 +75,7 @@ public:
     void Reuse(const Roots& oHeld);
 
     // Bytes that are free or were given up.
+    // In bytes: what IStorageDataset tells.
     std::uint64_t CountUnused() const;
     // Bytes before nEnd that may be taken.
     std::uint64_t CountFree(std::uint64_t nEnd) const;
@@ -93,13 +99,13 @@ private:
     std::string moLimitText;
     std::uint64_t mnEnd;
     std::uint64_t mnLimit;
-    std::uint64_t mnGeneration = 1;
+    std::uint64_t mnGeneration = 1;                // of the state that is being made
     std::map<std::uint64_t, std::uint64_t> moFree; // offset, bytes
     std::set<std::pair<std::uint64_t, std::uint64_t>> moBySize;
     std::map<std::uint64_t, std::uint64_t> moKept;  // offset, end
     std::map<std::uint64_t, std::uint64_t> moRoots; // of states that may be held: root, generation
     std::vector<GivenUp> moGivenUp;
-    bool mbOperation = false;
+    bool mbOperation = false;                                 // between Begin and Adopt or Undo
     std::vector<Extent> moTaken;                              // by the operation
     std::vector<std::pair<Extent, std::uint64_t>> moReleased; // by it, with what is kept of each
 };

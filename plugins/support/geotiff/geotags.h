@@ -14,6 +14,7 @@ namespace krv::plugins::support
 
 // The geographic part of a TIFF directory as plain values, whichever file the directory is in; empty where a tag is
 // absent.
+// A plain value. TIFF files hold them, and the GeoTIFF boxes of JPEG 2000.
 struct GeoTags
 {
     std::vector<double> moScale;       // 33550
@@ -24,6 +25,7 @@ struct GeoTags
     std::string moTexts;               // 34737
 };
 
+// Numbers of the tags, in the order of the members above.
 constexpr std::uint16_t TAG_GEO_SCALE = 33550;
 constexpr std::uint16_t TAG_GEO_TIE_POINTS = 33922;
 constexpr std::uint16_t TAG_GEO_MATRIX = 34264;
@@ -33,13 +35,14 @@ constexpr std::uint16_t TAG_GEO_TEXTS = 34737;
 
 // A raster position and the map position that belongs to it. Raster coordinates are continuous, (0, 0) being the outer
 // corner of the first pixel, whatever the file's own convention is.
+// In map units of the reference system, z in its vertical unit.
 struct TiePoint
 {
-    double column = 0.0;
+    double column = 0.0; // pixels, continuous
     double row = 0.0;
-    double x = 0.0;
+    double x = 0.0; // easting or longitude
     double y = 0.0;
-    double z = 0.0;
+    double z = 0.0; // 0 where the file says none
 };
 
 // Whether raster positions are pixel centres. False when nothing is said, or nothing sensible.
@@ -53,6 +56,7 @@ bool IsPixelPoint(const GeoTags& oTags);
 bool ReadGeocoding(const GeoTags& oTags, krv::ogc::cs::GeocodingInfo& oInfo);
 
 // All tie points, in their order; those with a value that is not finite are left out.
+// Half a pixel is added where the file counts from pixel centres.
 std::vector<TiePoint> ReadTiePoints(const GeoTags& oTags);
 
 // The reference system that the geographic keys define. A code of the EPSG database wins over whatever other keys say
@@ -66,12 +70,15 @@ std::unique_ptr<krv::ogc::cs::ICRS> ReadCRS(const GeoTags& oTags, const std::str
 
 // For the outer corner of the first pixel; the identity removes what is there. Pixel scale and tie point where they can
 // say it, else the matrix.
+// Tie points that are control points go; the raster type stays.
 void SetGeocoding(GeoTags& oTags, const krv::ogc::cs::GeocodingInfo& oInfo);
 // What positions in the file mean; the geocoding stays what it is.
+// bPoint: positions are pixel centres. The numbers in the file change by half a pixel, so that the place does not.
 void SetRasterType(GeoTags& oTags, bool bPoint);
 // Goes only where no other key needs it.
 void RemoveRasterType(GeoTags& oTags);
 // In place of a geocoding.
+// oPoints: with (0, 0) as the outer corner; none removes what is there.
 void SetTiePoints(GeoTags& oTags, const std::vector<TiePoint>& oPoints);
 // By its code, else by its parts, else as a text: the first of these that reads back as the same system. Throws
 // DataException that names the file when none does, and changes nothing.

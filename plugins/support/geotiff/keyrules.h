@@ -16,6 +16,7 @@ inline constexpr std::string_view DEFINITION_PREFIX = "ESRI PE String = ";
 
 // Where the value of a projection's parameter stands. Writers differ in the keys that they take: the first that is
 // there counts, and we write the first of all.
+// A constant of the library.
 struct ParameterKeys
 {
     int parameter = 0;                      // its code in the EPSG database
@@ -24,6 +25,7 @@ struct ParameterKeys
     std::uint16_t method = 0;               // value of key 3075 for which alone it is so; 0: for all the others
 };
 
+// nMethod: value of key 3075. nParameter: code of the EPSG database.
 const ParameterKeys& FindParameterKeys(std::uint16_t nMethod, int nParameter);
 
 // The projection method of a value of key 3075; null for one that cannot be expressed. Methods with variants are told

@@ -11,26 +11,31 @@ namespace krv::plugins::support
 
 // The decoded blocks of an image in the process's store. Those of images of one origin are shared as long as the file
 // is as it was when it was opened; who finds it changed goes on alone. One thread at a time.
+// Used by BlockImage. Memory is the store's, within the process's budget.
 class BlockTiles
 {
 public:
+    // The source outlives it. oCache says whether blocks are shared.
     BlockTiles(IBlockSource& oSource, const BlockCache& oCache);
 
     using Wait = krv::cache::TileOwner::Wait;
 
     // What of a block stays when all of it has to make room: columns at both sides, and rows.
+    // In pixels; 0: nothing of that side.
     struct Border
     {
-        unsigned int mnColumns = 0;
+        unsigned int mnColumns = 0; // left and right, each
         unsigned int mnTop = 0;
         unsigned int mnBottom = 0;
     };
 
     // A part of a block that is there, or is being decoded by somebody else, or nothing.
+    // Empty when there is nothing. The hold keeps the block in memory: let it go soon.
     krv::cache::TileHold Find(const BlockAddress& oBlock, const PixelRect& oPart) const;
 
     // A part of a block, which is decoded if it is not there. Nothing only when somebody else decodes it and eWait says
     // not to wait. oBefore: called before the block is decoded here. Throws what the source throws, for whomever.
+    // oPart: counted from the block's own corner, inside the part of it that lies in the image.
     template <typename Before>
     krv::cache::TileHold Load(const BlockAddress& oBlock, const PixelRect& oPart, const Border& oBorder, Wait eWait,
                               const Before& oBefore)
@@ -42,7 +47,10 @@ public:
     }
 
     // The block is not wanted again, but for nRows rows at its bottom.
+    // A block that is not there is no error.
     void Retire(const BlockAddress& oBlock, unsigned int nRows) const;
+
+    // Of every owner of the same origin.
     void Drop(const BlockAddress& oBlock) const;
     void DropAll() const;
 
@@ -74,10 +82,10 @@ private:
     void Fill(const BlockAddress& oBlock, unsigned char* pTarget);
     krv::cache::TileHold Publish(const BlockAddress& oBlock, const PixelRect& oPart, krv::cache::TileClaim& oClaim);
 
-    IBlockSource& moSource;
+    IBlockSource& moSource; // borrowed
     const ImageLayout& moLayout;
-    std::shared_ptr<const File> mpoFile; // null: not shared
-    std::unique_ptr<krv::cache::TileOwner> mpoOwner;
+    std::shared_ptr<const File> mpoFile;             // null: not shared
+    std::unique_ptr<krv::cache::TileOwner> mpoOwner; // never null
 };
 
 } // namespace krv::plugins::support

@@ -11,14 +11,16 @@ namespace krv::plugins::support
 {
 
 // A block of one plane.
+// All count from 0; planes are those of the layout.
 struct BlockAddress
 {
     unsigned int mnPlane = 0;
-    unsigned int mnColumn = 0;
-    unsigned int mnRow = 0;
+    unsigned int mnColumn = 0; // of blocks, from the left
+    unsigned int mnRow = 0;    // of blocks, from the top
 };
 
 // Where the pixels of an image come from, so that datasets which read the same share what they decoded.
+// Two sources of equal origins give the same pixels for the same block.
 struct BlockOrigin
 {
     // All pixels come from this file alone, and depend on nothing but what it held when it was opened. Null: nobody
@@ -31,6 +33,7 @@ struct BlockOrigin
 // What a format knows of one image: its layout and how a block is read. Everything else (windows, clipping, caching,
 // interleaving, checks of arguments) is the base's. Values go in and out in this machine's byte order, a plane's
 // channels pixel interleaved. One thread at a time.
+// Example: a format of plain rows has PlainSource; one of compressed tiles overrides GetLayout, ReadBlock and GetName.
 class IBlockSource
 {
 public:
@@ -54,17 +57,22 @@ public:
     virtual bool SparesParts() const { return false; }
 
     // The counterpart of ReadBlock for any part. Unless overridden it throws DataException: the format is read only.
+    // oPart: as for ReadBlock, but any part of the block inside the image. pSource is not kept. What is stored is read
+    // back.
     virtual void WriteBlock(const BlockAddress& oBlock, const PixelRect& oPart, const unsigned char* pSource,
                             std::size_t nPitch);
 
     // The name of the file, for messages.
+    // As users know it.
     virtual std::string GetName() const = 0;
 
     // Unless overridden nobody shares the decoded blocks.
+    // Asked once, when the image is made.
     virtual BlockOrigin GetOrigin() const;
 
     // Said before ReadBlock: the nBlocks blocks from oFirst on, to the right, are wanted next, all or some of them.
     // What is stored side by side can then be read with one call.
+    // A hint: nothing has to be done.
     virtual void Expect(const BlockAddress& oFirst, unsigned int nBlocks);
     // The same of blocks that are likely to be wanted later.
     virtual void Foresee(const BlockAddress& oFirst, unsigned int nBlocks);

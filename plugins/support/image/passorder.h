@@ -12,9 +12,11 @@ namespace krv::plugins::support
 // bottom, and how far its windows reach into the blocks around their tiles. What it tells decides which blocks make
 // room first, never what is read. Readers that take tiles in turn lag behind each other by a few: blocks are done with
 // only when the windows are some blocks further.
+// Without it a pass over a large image would push out of the store what other readers still want. One thread at a time.
 class PassOrder
 {
 public:
+    // oLayout: of the image; it outlives this.
     explicit PassOrder(const ImageLayout& oLayout)
         : moLayout(oLayout), mnLag(std::min(8u, oLayout.GetBlocksAcross() / 4))
     {
@@ -22,6 +24,7 @@ public:
 
     // What of a block is wanted by the windows beside those that want all of it: in order from left to right only rows
     // at its bottom, by the next row of windows.
+    // As wide as the windows so far reached into the blocks around them.
     BlockTiles::Border GetBorder() const
     {
         return IsOrdered() ? BlockTiles::Border{0, 0, mnRows} : BlockTiles::Border{mnColumns, mnRows, mnRows};
@@ -31,6 +34,7 @@ public:
 
     // Notes a window. oDone(column, row, rows): called for each block that is done with, but for so many rows at its
     // bottom.
+    // oWindow: inside the image. Constant time for each window, and for each block that is left.
     template <typename Done>
     void Note(const PixelRect& oWindow, const Done& oDone)
     {

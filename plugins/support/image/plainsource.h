@@ -15,17 +15,20 @@ namespace krv::plugins::support
 // Pixels that lie plain in a file: rows top to bottom, each plane at an offset and with a pitch of its own, values in
 // one byte order. Blocks are mere rectangles of it. Several channels are read and written in one go as well, whichever
 // way they lie, without blocks.
+// Reading needs no memory but some slices for values in the other order and for planes that are interleaved.
 class PlainSource : public IBlockSource
 {
 public:
     // Where a plane lies: its first value, and the bytes from row to row.
+    // Example: line-interleaved rows of 3 channels of 100 pixels of 8 bits: offsets 0, 100 and 200, a pitch of 300.
     struct Placement
     {
-        std::uint64_t mnOffset = 0;
-        std::uint64_t mnRowPitch = 0;
+        std::uint64_t mnOffset = 0;   // bytes from the beginning of the file
+        std::uint64_t mnRowPitch = 0; // bytes, gaps between rows included
     };
 
     // The rows of one channel after those of the other (eBand), a row of each in turn (eLine).
+    // Names of common headers: BSQ is eBand, BIL is eLine; BIP is one plane of all channels.
     enum class Order
     {
         eBand,
@@ -43,13 +46,19 @@ public:
     ~PlainSource() override;
 
     // The bytes of all pixels without gaps. Throws DataException above 2^62.
+    // What a new file of that layout takes behind its header.
     static std::uint64_t CountBytes(const ImageLayout& oLayout);
     // Planes without gaps; what no file can hold lies behind the end of any.
     static std::vector<Placement> PlacePlanes(const ImageLayout& oLayout, std::uint64_t nOffset, Order eOrder);
 
+    // As the constructor got it.
     const ImageLayout& GetLayout() const override { return moLayout; }
     std::string GetName() const override { return mpoFile->GetName(); }
+
+    // A part costs what its own bytes cost.
     bool ReadsParts() const override { return true; }
+
+    // Throws IOException for what cannot be read; the file may have become shorter.
     void ReadBlock(const BlockAddress& oBlock, const PixelRect& oPart, unsigned char* pTarget,
                    std::size_t nPitch) override;
     void WriteBlock(const BlockAddress& oBlock, const PixelRect& oPart, const unsigned char* pSource,
@@ -57,6 +66,7 @@ public:
 
     // A rectangle of the image, pixel interleaved in the order of the selection; row r lies at the pointer + r *
     // nPitch.
+    // Quicker than blocks where several channels lie in planes of their own: each is read in long pieces.
     void Read(const ChannelSelection& oChannels, const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch);
     void Write(const ChannelSelection& oChannels, const PixelRect& oRect, const unsigned char* pSource,
                std::size_t nPitch);
@@ -88,17 +98,19 @@ private:
     std::shared_ptr<File> mpoFile;
     ImageLayout moLayout;
     std::function<void()> moBeforeWrite;
-    std::vector<Placement> moPlacements;
-    bool mbSwap = false;
+    std::vector<Placement> moPlacements; // one for each plane
+    bool mbSwap = false;                 // the file has the other byte order
     Scratch moScratch;
-    Scratch moPlanes;
+    Scratch moPlanes; // rows of planes, before they are interleaved
 };
 
 // Windows over it, without a cache: the system has one of the file, which all readers share, and rows cost as much to
 // copy from there as from a store of ours, which would hold the same bytes once more.
+// Made by formats for their IRasterIO in place of BlockRasterIO.
 class PlainIO : public krv::datasources::WindowedIO<krv::datasources::IRasterIO>
 {
 public:
+    // poSource: shared with the dataset. Throws as ChannelSelection.
     PlainIO(std::shared_ptr<PlainSource> poSource, const std::vector<unsigned int>& oChannels,
             const Place& oPlace = Place::Current());
     ~PlainIO() override;

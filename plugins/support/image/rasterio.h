@@ -10,14 +10,17 @@ namespace krv::plugins::support
 {
 
 // The transfer of windows for a list of channels of a block image. Base is IRasterIO or IOverviewIO.
+// Keeps the image, and by it the file, open: it may outlive its dataset as far as memory goes.
 template <typename Base>
 class BlockRasterIO : public krv::datasources::WindowedIO<Base>
 {
 public:
+    // Throws as ChannelSelection.
     BlockRasterIO(std::shared_ptr<BlockImage> poImage, const std::vector<unsigned int>& oChannels,
                   const Place& oPlace = Place::Current());
     ~BlockRasterIO() override;
 
+    // Pixels of the image, and of the tile that readers best take.
     unsigned int GetFileWidth() const override;
     unsigned int GetFileHeight() const override;
     unsigned int GetTileWidth() const override;
@@ -28,7 +31,7 @@ private:
     void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) override;
     void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) override;
 
-    std::shared_ptr<BlockImage> mpoImage;
+    std::shared_ptr<BlockImage> mpoImage; // shared with the dataset
     ChannelSelection moChannels;
     // What readers are told to use: the layout's, but never more than 64 MiB for all channels together.
     unsigned int mnTileWidth;
@@ -44,6 +47,7 @@ using RasterIO = BlockRasterIO<krv::datasources::IRasterIO>;
 class OverviewIO : public BlockRasterIO<krv::datasources::IOverviewIO>
 {
 public:
+    // nLevel: what GetLevel answers; the size is the image's.
     OverviewIO(unsigned int nLevel, std::shared_ptr<BlockImage> poImage, const std::vector<unsigned int>& oChannels,
                const Place& oPlace = Place::Current());
     ~OverviewIO() override;

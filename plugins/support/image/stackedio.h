@@ -10,11 +10,13 @@ namespace krv::plugins::support
 {
 
 // Several one-channel I/O objects of the same image size and type, read and written as the channels of one.
+// For formats whose channels, masks or levels are images of their own.
 class StackedIO : public krv::datasources::WindowedIO<krv::datasources::IOverviewIO>
 {
 public:
     // nValueBytes: bytes of one value of the common type. nLevel: what GetLevel answers; 1 for full size.
     // Throws DataException for an empty list and for sizes that differ.
+    // oParts: not empty, each of one channel and of the common type; taken over.
     StackedIO(std::vector<std::unique_ptr<krv::datasources::IRasterIO>> oParts, unsigned int nValueBytes,
               unsigned int nLevel);
     ~StackedIO() override;
@@ -33,9 +35,9 @@ private:
     void ForEachSlice(const PixelRect& oRect, const Action& oAction);
 
     std::vector<std::unique_ptr<krv::datasources::IRasterIO>> moParts;
-    unsigned int mnValueBytes;
+    unsigned int mnValueBytes; // of one part
     unsigned int mnLevel;
-    Scratch moScratch;
+    Scratch moScratch; // a slice of one part
 };
 
 } // namespace krv::plugins::support

@@ -12,6 +12,7 @@ namespace krv::plugins::support
 inline constexpr unsigned int FIRST_LEVEL_PAGE = 1;
 
 // Marks all levels of such a file, which is open for update, as outdated for all channels.
+// Nothing is synchronised here.
 void ForgetLevels(krv::datasources::IDataset& oLevels);
 
 } // namespace krv::plugins::support

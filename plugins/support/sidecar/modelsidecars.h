@@ -13,6 +13,7 @@ namespace krv::plugins::support
 inline constexpr unsigned int FIRST_OWN_MODEL = 3;
 
 // The numbers of those that are there, ascending.
+// fileName: of the image. Looks for names; reads nothing.
 std::vector<unsigned int> FindModelSidecars(const std::string& fileName);
 
 // Throws FileFormatException that names the sidecar when it is no model, and DataException when there is none of that
@@ -20,6 +21,7 @@ std::vector<unsigned int> FindModelSidecars(const std::string& fileName);
 krv::mathmodel::RpcCoefficients ReadModelSidecar(const std::string& fileName, unsigned int nModel);
 
 // Replaces the text of number 1 as a whole, or makes it.
+// Throws what writing throws; an older text then stays as it was.
 void WriteModelSidecar(const std::string& fileName, const krv::mathmodel::RpcCoefficients& oModel);
 
 } // namespace krv::plugins::support

@@ -14,6 +14,7 @@ inline constexpr char AUX_XML_ENDING[] = ".aux.xml";
 // The file that lies beside another one under its name with an ending, such as "_RPC.TXT", in place of the extension;
 // empty when there is none. Looked for by exact names, never by listing the folder: the ending as it is given, in small
 // letters and in capitals, then the whole name in small letters and in capitals.
+// Some looks at names; nothing is opened.
 std::string FindSidecar(const std::string& fileName, const std::string& ending);
 
 // The same with the ending behind the whole name, such as ".msk".
@@ -25,6 +26,7 @@ std::vector<std::string> ListCompanions(const std::string& fileName);
 
 // All of a sidecar. Throws FileFormatException when it has more than nMaximum bytes, and what opening and reading
 // throw.
+// nMaximum: bytes; the file may be anybody's.
 std::string ReadSidecar(const std::string& sidecar, std::size_t nMaximum);
 
 } // namespace krv::plugins::support

@@ -33,6 +33,7 @@ inline constexpr char NO_ZONES[] =
 // The files beside an image that say what its own file does not. Each is looked for by its exact names when somebody
 // asks for what it says, and read once. One that cannot be used is warned of and is as if it were not there. A file
 // that is itself a sidecar, by its ending, has none. One thread at a time.
+// Belongs to a Dataset; formats reach it by GetSidecars.
 class Sidecars
 {
 public:
@@ -43,19 +44,25 @@ public:
     Sidecars& operator=(const Sidecars&) = delete;
 
     // By the transform of ".aux.xml", or else the world file.
+    // For the outer corner of the first pixel, whatever the file counts from. Nothing when there is none.
     std::optional<krv::ogc::cs::GeocodingInfo> ReadGeocoding();
     // By ".aux.xml", or else ".prj". Null when there is none.
+    // A new object; a text that defines no system is warned of and counts as none.
     std::unique_ptr<krv::ogc::cs::ICRS> ReadCRS();
     // Adds what a record lacks: tags, descriptions, and no-data values where neither the channel nor the file has one.
+    // What the record has already wins.
     void AddTags(krv::datasources::AuxiliaryData& oRecord);
     // The masks of ".msk" by their numbers: 1 for one of the image; where each channel has its own, those of the
     // channels; none when it says of no pixel that it is not valid.
     std::vector<unsigned int> ListMasks();
+
+    // By its number; false, not an exception, for any other.
     bool HasMask(unsigned int nMask);
     // Empty for the image's own; one of a channel is a zone but for the tag that says of which channel it is.
     std::string DescribeMask(unsigned int nMask);
     krv::datasources::MetadataMap GetMaskTags(unsigned int nMask);
     // Its pixels as those of a bitmap: 1 is valid. They are the caller's and go before this object.
+    // bWrite: its pixels are to be changed, and stored by Store. Throws DataException for a mask that is not there.
     krv::datasources::IRasterIO* OpenMask(unsigned int nMask, bool bWrite);
     // A mask of no valid pixel, which is there for others after Store; returns its number. It is a zone, which cannot
     // be stored, until it is declared the image's, or that of a channel before somebody opens it. Channels without a
@@ -67,11 +74,14 @@ public:
     // The one that is not declared.
     void DropZone();
     // All of them.
+    // The file beside goes with Store.
     void DropMasks();
 
     // Sensor models, by the numbers of FindModelSidecars; one that is set is written by Store.
     std::vector<unsigned int> ListModels() const;
     krv::mathmodel::RpcCoefficients ReadModel(unsigned int nModel) const;
+
+    // Returns its number. One that is there is replaced.
     unsigned int SetModel(const krv::mathmodel::RpcCoefficients& oModel);
 
     // What ".aux.xml" says; what is set counts at once, and Store replaces the file as a whole, or removes one that
@@ -84,7 +94,11 @@ public:
 
     // Throws DataException for what Store cannot keep.
     void CheckStore() const;
+
+    // Whether Store has anything to do.
     bool HoldsChanges() const;
+
+    // Throws what writing throws; what is stored by then stays stored.
     void Store();
 
     // All that lie beside the file, each with what came of it, those included that nobody asked for. oNeeds: whether
@@ -121,13 +135,13 @@ private:
     unsigned int mnChannels;
     bool mbNone; // the file itself is one, or new
     std::optional<AuxXml> moAuxXml;
-    std::string moAuxXmlName; // as found; empty when there is none
-    bool mbAuxXmlChanged = false;
-    std::optional<std::string> moMaskName; // as found, once it was looked for
-    std::unique_ptr<krv::datasources::IDataset> mpoMask;
+    std::string moAuxXmlName;                            // as found; empty when there is none
+    bool mbAuxXmlChanged = false;                        // Store writes it
+    std::optional<std::string> moMaskName;               // as found, once it was looked for
+    std::unique_ptr<krv::datasources::IDataset> mpoMask; // the file of masks; null: none, or not looked for
     struct Mask
     {
-        unsigned int mnNumber;
+        unsigned int mnNumber;  // as bitmaps of the dataset have it
         unsigned int mnChannel; // 0 for the image's, and for a zone
     };
     std::vector<Mask> moMasks;
@@ -136,7 +150,7 @@ private:
     bool mbMaskWritten = false;
     bool mbMaskChanged = false;
     std::optional<krv::mathmodel::RpcCoefficients> moModel; // to be written
-    bool mbForgotten = false;
+    bool mbForgotten = false;                               // statistics beside are gone already
     bool mbLevelsForgotten = false;
     std::map<std::string, std::string> moTroubles; // by sidecar
 };

@@ -13,6 +13,7 @@ namespace krv::plugins::support
 // The life of a file that is written. What changes is the file's after Synchronize or Finish; a new file has its name
 // only then, so that it is whole or absent, and one that is discarded before is removed. A format derives from it and
 // says what there is to store. One thread at a time.
+// Belongs to a Dataset, whose Synchronize, Close and destructor call Synchronize, Finish and Discard.
 class FileWriter
 {
 public:
@@ -28,9 +29,13 @@ public:
     const std::string& GetFileName() const { return moFileName; }
     // Null before a new file is made.
     const std::shared_ptr<File>& GetFile() const { return mpoFile; }
+
+    // False for a new file before its image is laid out.
     bool HasFile() const { return mpoFile != nullptr; }
     // Whether the file lies under its own name.
     bool IsNamed() const { return mbNamed; }
+
+    // Nothing can be written any more.
     bool IsEnded() const { return mbEnded; }
     // A new file takes its name only when nobody has it.
     void KeepExisting() { mbReplaces = false; }
@@ -39,6 +44,7 @@ public:
     // Whether something would be lost if the writer went now.
     bool HasUnsaved() const { return !mbEnded && HasFile() && (!mbNamed || HoldsChanges()); }
 
+    // Stores, and gives a new file its name. Throws what Store throws, and may be called again then.
     void Synchronize();
     // The same for the last time.
     virtual void Finish();
@@ -56,6 +62,7 @@ protected:
     // What GetFile gives stays.
     void StoreAnew(const std::function<void(File&)>& oWrite);
 
+    // Throws as NewFile.
     void MakeFile();
     // In place of it: a file without a name for what is written, in the folder of scratch files, of which Store makes
     // that which takes the name. Throws as NewFile when that could not be made.
@@ -73,10 +80,10 @@ private:
     void TakeName(NewFile& oNew);
 
     std::string moFileName;
-    std::shared_ptr<File> mpoFile;
+    std::shared_ptr<File> mpoFile;   // null before a new one is made
     std::unique_ptr<NewFile> mpoNew; // until it has its name
-    bool mbNamed;
-    bool mbReplaces = true;
+    bool mbNamed;                    // the file lies under its own name
+    bool mbReplaces = true;          // an older file of the name gives way
     bool mbEnded = false;
 };
 

@@ -18,6 +18,7 @@ class HeadedFile : public FileWriter
 {
 public:
     // The first lines, of one length, with their ends.
+    // Example: {"MYFORMAT 1\n", "UNFINISHED\n"} with blanks so that both have one length.
     struct FirstLines
     {
         std::string moFinished;
@@ -25,6 +26,7 @@ public:
     };
 
     // A new file, which Make makes.
+    // oFirstLines: copied. Nothing is made yet.
     HeadedFile(const std::string& fileName, const FirstLines& oFirstLines);
     // An existing one. Throws FileFormatException for anything but a whole header of a finished file.
     HeadedFile(std::shared_ptr<File> poFile, const FirstLines& oFirstLines);
@@ -42,6 +44,7 @@ public:
     // To be called before anything behind the header changes.
     void BeginChange();
     // Adds nBytes bytes of 0 and returns where they begin.
+    // What nothing in the header names is nobody's.
     std::uint64_t Append(std::uint64_t nBytes);
 
 protected:
@@ -49,8 +52,8 @@ protected:
     bool HoldsChanges() const override { return mbChanged; }
 
 private:
-    FirstLines moFirstLines;
-    std::string moHeader;
+    FirstLines moFirstLines; // of one length
+    std::string moHeader;    // the text behind the first line, as Store writes it
     std::uint64_t mnHeaderBytes;
     bool mbMarked = false;  // for certain, on the disk
     bool mbChanged = false; // or about to be

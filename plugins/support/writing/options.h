@@ -17,13 +17,19 @@ namespace krv::plugins::support
 
 // What users may say of a new file: KEY=VALUE, separated by blanks, in any letter case. A format adds its keys, in
 // capitals, with the place that the value of each goes to; one that is not given leaves its place alone.
+// Example:
+//   Options oOptions;
+//   oOptions.AddNumber("LEVEL", nLevel, 1, 9);
+//   oOptions.Parse("level=7");
+// Places outlive the object.
 class Options
 {
 public:
     // A key as users are told of it, and what it takes: "YES, NO", "a number from 1 to 9".
+    // A plain value.
     struct Description
     {
-        std::string moKey;
+        std::string moKey; // in capitals
         std::string moTakes;
     };
 
@@ -47,8 +53,10 @@ public:
         moKeys.push_back({{key, takes}, Take});
     }
 
+    // YES or NO.
     void AddFlag(const std::string& key, bool& bTarget) { AddChoice(key, bTarget, {{"YES", true}, {"NO", false}}); }
 
+    // A whole number from nFrom to nTo, decimal digits alone.
     template <typename T>
     void AddNumber(const std::string& key, T& oTarget, std::uint32_t nFrom, std::uint32_t nTo)
     {
@@ -72,6 +80,8 @@ public:
 
     // Whether the text that was parsed has a key.
     bool IsGiven(const std::string& key) const;
+
+    // In the order in which the keys were added.
     std::vector<Description> Describe() const;
 
 private:

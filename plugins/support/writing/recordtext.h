@@ -22,18 +22,24 @@ namespace krv::plugins::support
 //     [level 2]=81920     a number that the format finds the level by
 // Lines without "=" mean nothing. In keys and values %XX stands for the byte of that hexadecimal number: a key has none
 // of %, = and control characters otherwise, nor a [ at its beginning, and a value none of % and control characters.
+// A plain value in memory.
 class RecordText
 {
 public:
-    krv::datasources::AuxiliaryData moTags;
+    krv::datasources::AuxiliaryData moTags;         // of file and channels
     std::map<unsigned int, std::uint64_t> moLevels; // from 2 on
 
     // Adds the lines up to the end; channels that moTags does not have are nobody's.
+    // Lines come from a file and may be anything: those that make no sense are passed over.
     void Read(std::istream& oLines);
+
+    // Each line with its end. What Read makes of it is the same record.
     std::string Write() const;
 
     // Null when there is none. Throws DataException for a text that defines no system.
     std::unique_ptr<krv::ogc::cs::ICRS> GetCRS() const;
+
+    // Kept as a text, so that it costs nothing to carry along.
     void SetCRS(const krv::ogc::cs::ICRS& oCRS);
     // Its definition as it is kept; empty when there is none.
     std::string GetDefinition() const;

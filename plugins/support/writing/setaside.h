@@ -7,6 +7,7 @@ namespace krv::plugins::support
 {
 
 // Old files out of the way of a new one: back in their places when this goes, unless they were dropped before.
+// For files that belong to an image that is about to be replaced: levels, masks, tags beside it.
 class SetAside
 {
 public:
@@ -18,13 +19,14 @@ public:
     SetAside& operator=(const SetAside&) = delete;
 
     // Removes them.
+    // To be called when the new file has its name.
     void Drop();
 
 private:
     struct Moved
     {
-        std::string moName;
-        std::string moAside;
+        std::string moName;  // where it lay
+        std::string moAside; // where it lies meanwhile, in the same folder
     };
 
     void PutBack() noexcept;

@@ -14,6 +14,9 @@ namespace krv::ogc::cs
 // database (proj.db) is such a cause. Nothing is printed, the network is not used. Callable from any thread.
 
 // The system of an EPSG code.
+// Example: CreateCRSFromEPSG(32633)->GetName() is "WGS 84 / UTM zone 33N". The first call of a process opens the
+// database
+// and takes some milliseconds, others much less.
 KRV_TOOLKIT_API std::unique_ptr<ICRS> CreateCRSFromEPSG(int nCode, const Place& oPlace = Place::Current());
 
 // The system of a definition: WKT1 (both common dialects), WKT2, PROJJSON or "EPSG:n"; white space around it is
@@ -32,9 +35,11 @@ enum eEPSGPart
 };
 
 // The definition of a part as PROJJSON, ready to be put into the definition of a larger one. Throws when there is none.
+// One line of text, which the makers of other systems take in place of the part's numbers.
 KRV_TOOLKIT_API std::string DescribeEPSGPart(eEPSGPart ePart, int nCode, const Place& oPlace = Place::Current());
 
 // A unit of measure in the EPSG database: its name and its size in metres, radians or ones.
+// Neither angular nor linear: a ratio.
 struct EPSGUnit
 {
     std::string name;

@@ -10,17 +10,20 @@ namespace krv::ogc::cs
 
 // A parameter of a projection: its name, such as "Latitude of natural origin", its value in its own unit, that unit's
 // name and its size in radians, metres or ones.
+// Example: {"False easting", 500000, "metre", 1}.
 struct ProjectionParameter
 {
     std::string name;
-    double value = 0.0;
-    std::string unitName;
-    double unitFactor = 1.0;
+    double value = 0.0;      // in its own unit
+    std::string unitName;    // such as "degree"
+    double unitFactor = 1.0; // radians, metres or ones in one unit
 };
 
 // A coordinate reference system. Made by the functions of crsfactory.h. Objects are immutable; one is used by one
 // thread at a time, a clone may go to another thread. Every operation throws krv::DataException when the reference
 // system library cannot answer.
+// Axes of coordinates are x = easting or longitude and y = northing or latitude everywhere, whatever the definition
+// says.
 class KRV_TOOLKIT_API ICRS
 {
 public:
@@ -46,6 +49,7 @@ public:
 
     // Whether both describe the same system: same datum, ellipsoid, projection and parameters. Names, and the order in
     // which the authority lists the axes, do not matter.
+    // Costs up to some milliseconds: to be asked once for a file, not for each point.
     virtual bool IsEquivalent(const ICRS& oOther) const = 0;
 
     // Kind of the horizontal part (that of the base system for a bound, of the first part for a compound one).

@@ -10,6 +10,7 @@ namespace krv::ogc::cs
 class GeocodingInfo;
 
 // A rectangle of pixels, from its first column and row.
+// Columns and rows count from 0. A width or height of 0 is an empty window.
 struct PixelWindow
 {
     unsigned int x = 0;
@@ -19,6 +20,7 @@ struct PixelWindow
 };
 
 // A rectangle in map coordinates, in the unit of a reference system; west is below east, south below north.
+// Outer edges of pixels, not their centres.
 struct MapBounds
 {
     double west = 0;
@@ -28,6 +30,7 @@ struct MapBounds
 };
 
 // The smallest rectangle that holds the image of so many pixels.
+// Of a rotated image it is larger than the image itself. nWidth, nHeight: pixels; parts of one are allowed.
 KRV_TOOLKIT_API MapBounds OutlineOf(const GeocodingInfo& oInfo, double nWidth, double nHeight);
 
 // The pixels of an image of that size that the bounds touch, those that are no more than a millionth aside: of a
