@@ -16,7 +16,7 @@ using FilePointer = krv::OwnedOrBorrowed<const SourceFile>;
 
 // What each thread of a job needs for itself, readers of a file among it. The first worker stands on the file itself,
 // the others each on one of their own, opened again; where that cannot be there is just the first.
-// Example: FileWorkers<Reader> oWorkers(oFile, Make); then FileWorkers<Reader>::Use oWorker(oWorkers) in each task.
+// Example: FileWorkers<Reader> oWorkers(oFile, oMake); each task makes a Use of oWorkers and reads by that.
 // Worker: not moved and used by one thread at a time, so that it needs no lock.
 template <typename Worker>
 class FileWorkers : public krv::threading::StateStore<Worker>

@@ -13,7 +13,7 @@ namespace krv::threading
 // What a task needs for itself while it runs, such as a reader of its own: taken when it begins, made when none is
 // free, given back at its end. There are never more than tasks that run at one time.
 // Any thread may use a store. States are of one kind: which one a task gets does not matter.
-// Example: StateStore<Decoder>::Use oDecoder(oDecoders); oDecoder->Run(...);
+// A task makes a Use of the store when it begins, and works by that: oUse->Run(...).
 template <typename T>
 class StateStore
 {
