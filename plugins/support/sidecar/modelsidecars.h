@@ -15,6 +15,9 @@ inline constexpr unsigned int FIRST_OWN_MODEL = 3;
 // The numbers of those that are there, ascending.
 std::vector<unsigned int> FindModelSidecars(const std::string& fileName);
 
+// The text of a number; empty when there is none.
+std::string FindModelSidecar(const std::string& fileName, unsigned int nModel);
+
 // Throws FileFormatException that names the sidecar when it is no model, and DataException when there is none of that
 // number.
 krv::mathmodel::RpcCoefficients ReadModelSidecar(const std::string& fileName, unsigned int nModel);
