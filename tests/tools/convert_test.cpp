@@ -513,18 +513,30 @@ TEST(Convert, MasksOfChannelsFollowThem)
     const std::pair<Texts, std::vector<int>> COPIES[] = {{{"--channels", "3,1"}, {300, 100}},
                                                          {{"--channels", "2", "--window", "0,0,60,3"}, {180}},
                                                          {{"--type", "16U", "--scale", "0,9"}, {100, 200, 300}}};
+    const auto CompareValid = [](const std::string& copy, const std::vector<int>& oValid)
+    {
+        const auto oChannels = krv::test::RunKrv({"stats", copy, "--json"}).Json()["channels"];
+        ASSERT_EQ(oChannels.size(), oValid.size());
+        for (std::size_t n = 0; n < oValid.size(); ++n)
+            EXPECT_EQ(oChannels[n]["valid"], oValid[n]) << copy << ", channel " << n;
+    };
     for (const char* const pName : {"copy.tif", "copy.krv", "copy.img", "copy.jp2", "copy.j2k", "copy.demo"})
         for (const auto& [oOptions, oValid] : COPIES)
         {
+            SCOPED_TRACE(oOptions.back());
             Texts oArguments = {file, oFolder.File(pName)};
             oArguments.insert(oArguments.end(), oOptions.begin(), oOptions.end());
             const auto oRun = RunConvert(oArguments);
             EXPECT_TRUE(oRun.code == 0 && oRun.errors.empty()) << pName << ": " << oRun.errors;
-            const auto oChannels = krv::test::RunKrv({"stats", oFolder.File(pName), "--json"}).Json()["channels"];
-            ASSERT_EQ(oChannels.size(), oValid.size());
-            for (std::size_t n = 0; n < oValid.size(); ++n)
-                EXPECT_EQ(oChannels[n]["valid"], oValid[n]) << pName << ", " << oOptions.back() << ", channel " << n;
+            CompareValid(oFolder.File(pName), oValid);
         }
+    // So do the pixels of another grid, where a value stands for those that are not valid.
+    const std::string warped = oFolder.File("warped.tif");
+    ASSERT_EQ(krv::test::RunKrv({"edit", file, "--origin", "0,40", "--pixel-size", "1"}).code, 0);
+    EXPECT_NE(krv::test::RunKrv({"warp", file, warped, "--resolution", "1"}).errors.find("mask of a channel"),
+              std::string::npos);
+    ASSERT_EQ(krv::test::RunKrv({"warp", file, warped, "--resolution", "1", "--no-data", "0"}).code, 0);
+    CompareValid(warped, {100, 200, 300});
 }
 
 TEST(Convert, FailuresLeaveNothingBehindAndTheOldFileAsItWas)
