@@ -64,5 +64,7 @@ KRV_DATASOURCES_API unsigned int FindValidityMask(const IBitmapDataset& oBitmaps
 // The bitmaps that say it of single channels, by the number of the channel; of several the one with the lowest number.
 // Tags that are no number of a channel count for nothing.
 KRV_DATASOURCES_API std::map<unsigned int, unsigned int> FindChannelMasks(const IBitmapDataset& oBitmaps);
+// What such a bitmap is called where nobody gave it a name.
+KRV_DATASOURCES_API std::string NameChannelMask(unsigned int nChannel);
 
 } // namespace krv::datasources

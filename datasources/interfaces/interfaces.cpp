@@ -87,4 +87,9 @@ std::map<unsigned int, unsigned int> FindChannelMasks(const IBitmapDataset& oBit
     return oMasks;
 }
 
+std::string NameChannelMask(unsigned int nChannel)
+{
+    return "Validity of channel " + std::to_string(nChannel);
+}
+
 } // namespace krv::datasources

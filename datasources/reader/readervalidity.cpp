@@ -53,6 +53,11 @@ bool ReaderValidity::IsByValues() const
     return mpoFacet == nullptr && mpoSource != nullptr && !mpoSource->HasBitmap() && !mpoSource->HasAlpha();
 }
 
+const krv::gobs::IMaskBuilder* ReaderValidity::GetChannelMask(std::size_t nPosition) const
+{
+    return mpoSource != nullptr ? mpoSource->GetChannelMask(nPosition) : nullptr;
+}
+
 std::unique_ptr<krv::gobs::Mask> ReaderValidity::Read(krv::gobs::Raster& oRaster)
 {
     std::unique_ptr<krv::gobs::Mask> poMask;

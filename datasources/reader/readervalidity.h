@@ -3,10 +3,12 @@
 #include "datasources/api.h"
 #include "gobs/mask/maskdecision.h"
 
+#include <cstddef>
 #include <memory>
 
 namespace krv::gobs
 {
+class IMaskBuilder;
 class Mask;
 class Raster;
 } // namespace krv::gobs
@@ -38,6 +40,9 @@ public:
     bool IsNeeded() const { return mbNeeded; }
     // Whether nothing but the values of the pixels themselves says so, by the record of their dataset.
     bool IsByValues() const;
+    // What marks the pixels that the mask of a channel alone says to be background, by its position in the rasters,
+    // from 0; null when it has none. It goes with this.
+    const krv::gobs::IMaskBuilder* GetChannelMask(std::size_t nPosition) const;
     // Fills the raster, and gives a new mask over its full extent whose set bits are valid pixels; null, which means
     // all pixels of the image, when it is not needed.
     // Throws what reading pixels, mask and alpha throws. The mask is the caller's and stands on nothing.

@@ -161,35 +161,45 @@ void CopyChannels(const CopyPlan& oPlan, const Target& oTarget)
     }
 }
 
-// The tags of a bitmap of the first file; one that belongs to a channel follows it to its new number. No value when
-// the channel is not copied.
-std::optional<MetadataMap> FindBitmapTags(const CopyPlan& oPlan, const IBitmapDataset& oFrom, unsigned int nBitmap)
+// What is said of a bitmap beside its pixels.
+struct BitmapRecord
 {
-    MetadataMap oTags = oFrom.GetBitmapMetadata(nBitmap);
-    const auto oOwner = oTags.find(krv::datasources::VALIDITY_OF_CHANNEL);
-    if (oOwner == oTags.end())
-        return oTags;
+    std::string description;
+    MetadataMap tags;
+};
+
+// Of a bitmap of the first file; one that belongs to a channel follows it to its new number. No value when the channel
+// is not copied.
+std::optional<BitmapRecord> FindBitmapRecord(const CopyPlan& oPlan, const IBitmapDataset& oFrom, unsigned int nBitmap)
+{
+    BitmapRecord oRecord{oFrom.GetBitmapDescription(nBitmap), oFrom.GetBitmapMetadata(nBitmap)};
+    const auto oOwner = oRecord.tags.find(krv::datasources::VALIDITY_OF_CHANNEL);
+    if (oOwner == oRecord.tags.end())
+        return oRecord;
     for (std::size_t i = 0; i < oPlan.GetChannels().size(); ++i)
     {
         const CopiedChannel& oChannel = oPlan.GetChannels()[i];
         if (oChannel.source != 0 || std::to_string(oChannel.channel) != oOwner->second)
             continue;
         oOwner->second = std::to_string(i + 1);
-        return oTags;
+        if (oRecord.description == krv::datasources::NameChannelMask(oChannel.channel))
+            oRecord.description = krv::datasources::NameChannelMask(static_cast<unsigned int>(i) + 1);
+        return oRecord;
     }
     return std::nullopt;
 }
 
-unsigned int CopyBitmap(const SourceFile& oSource, unsigned int nFrom, const MetadataMap& oTags, const Target& oTarget,
-                        const PixelWindow& oWindow)
+unsigned int CopyBitmap(const SourceFile& oSource, unsigned int nFrom, const BitmapRecord& oRecord,
+                        const Target& oTarget, const PixelWindow& oWindow)
 {
-    const auto& oFrom = dynamic_cast<const IBitmapDataset&>(oSource.GetDataset());
     IBitmapDataset& oTo = *oTarget.Find<IBitmapDataset>();
     const unsigned int nTo = oTo.CreateBitmap();
-    // What it is comes before what it is called: some formats have room for validity alone.
-    if (!oTags.empty())
-        oTo.SetBitmapMetadata(nTo, oTags);
-    oTo.SetBitmapDescription(nTo, oFrom.GetBitmapDescription(nFrom));
+    // What it is comes before what it is called: some formats have room for validity alone, and the mask of their only
+    // channel is that of the image, which has no name.
+    if (!oRecord.tags.empty())
+        oTo.SetBitmapMetadata(nTo, oRecord.tags);
+    if (krv::datasources::FindValidityMask(oTo) != nTo)
+        oTo.SetBitmapDescription(nTo, oRecord.description);
     const auto Open = [nFrom](const SourceFile& oFile)
     {
         auto& oBitmaps = dynamic_cast<IBitmapDataset&>(oFile.GetDataset());
@@ -221,11 +231,11 @@ BitmapNumbers CopyBitmaps(const CopyPlan& oPlan, const Target& oTarget)
             continue;
         }
         for (const unsigned int nBitmap : oList)
-            if (const auto oTags = FindBitmapTags(oPlan, *poFrom, nBitmap))
+            if (const auto oRecord = FindBitmapRecord(oPlan, *poFrom, nBitmap))
                 oTarget.Try(Of(oPlan, s, fmt::format("bitmap {}", nBitmap)),
                             [&] {
                                 oNumbers[nBitmap] =
-                                    CopyBitmap(oPlan.GetSource(s), nBitmap, *oTags, oTarget, oPlan.GetWindow());
+                                    CopyBitmap(oPlan.GetSource(s), nBitmap, *oRecord, oTarget, oPlan.GetWindow());
                             });
     }
     return oNumbers;

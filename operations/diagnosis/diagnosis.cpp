@@ -241,7 +241,7 @@ bool AreAllValid(const IOverviewManager& oLevels, unsigned int nLevel, unsigned 
 // Reads what the other verbs read beside pixels, one thing after the other, so that each that fails is named.
 void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Finding>& oFindings)
 {
-    const auto Try = [&](const char* pWhat, const std::function<void()>& oRead)
+    const auto Try = [&](const std::string& what, const std::function<void()>& oRead)
     {
         try
         {
@@ -250,7 +250,7 @@ void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Findin
         catch (...)
         {
             oFindings.push_back(
-                {false, subject, fmt::format("{} cannot be read: {}", pWhat, CurrentMessage()), DAMAGE_REMEDY});
+                {false, subject, fmt::format("{} cannot be read: {}", what, CurrentMessage()), DAMAGE_REMEDY});
         }
     };
     Try("the metadata", [&] { oDataset.ReadAuxiliaryData(); });
@@ -291,9 +291,10 @@ void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Findin
             [&]
             {
                 for (const unsigned int nModel : poModels->GetMathModelList())
-                    std::unique_ptr<krv::mathmodel::IMathModel>(poModels->GetMathModel(nModel));
+                    Try(fmt::format("sensor model {}", nModel),
+                        [&] { std::unique_ptr<krv::mathmodel::IMathModel>(poModels->GetMathModel(nModel)); });
             });
-    // What is wrong with one that is not used is a warning already.
+    // What is wrong with one that is not used was said already.
     if (auto* const poSidecars = dynamic_cast<ISidecarDataset*>(&oDataset); poSidecars != nullptr)
         Try("the files beside it",
             [&]
@@ -355,7 +356,11 @@ void CheckOpening(const std::string& file, const LoadedPlugin& oPlugin, std::vec
     const std::string subject = "format " + oPlugin.name;
     std::vector<std::string> oWarnings;
     const auto oFormerSink = krv::nspio::Warning::SetSink(
-        [&oWarnings](const std::string& message, const std::string&, unsigned int) { oWarnings.push_back(message); });
+        [&oWarnings](const std::string& message, const std::string&, unsigned int)
+        {
+            if (std::find(oWarnings.begin(), oWarnings.end(), message) == oWarnings.end())
+                oWarnings.push_back(message);
+        });
     try
     {
         const std::unique_ptr<IDataset> poDataset(oPlugin.builder->Open(file, eReadOnly));
@@ -423,9 +428,17 @@ std::string DescribeUnknown(const std::string& file)
     {
         std::error_code oNone;
         const std::size_t nBytes = std::filesystem::is_regular_file(header, oNone) ? ReadHeader(header, oHeader) : 0;
-        if (nBytes >= ENVI.size() && std::memcmp(oHeader.data(), ENVI.data(), ENVI.size()) == 0)
-            return fmt::format("the ENVI header {} beside it tells of a file of another size, or is no text", header);
+        if (nBytes < ENVI.size() || std::memcmp(oHeader.data(), ENVI.data(), ENVI.size()) != 0)
+            continue;
+        const std::string_view text(reinterpret_cast<const char*>(oHeader.data()), nBytes);
+        const std::size_t nNext = text.find_first_not_of(" \t", ENVI.size());
+        const bool bAlone = nNext == std::string_view::npos || text[nNext] == '\r' || text[nNext] == '\n';
+        return fmt::format("the ENVI header {} beside it {}", header,
+                           bAlone ? "tells of a file of another size, or is no text"
+                                  : "says more than ENVI in its first line");
     }
+    if (std::filesystem::path(file).extension() == ".hgt")
+        return "an elevation tile is called by its place, such as N00E010.hgt, and has 1201 or 3601 samples a side";
     return {};
 }
 

@@ -7,6 +7,7 @@
 #include "datasources/reader/basicreader.h"
 #include "datasources/reader/derived/findpct.h"
 #include "datasources/reader/derived/transformrasterreader.h"
+#include "datasources/reader/validitysource.h"
 #include "gobs/pct/pct.h"
 #include "gobs/resampling/gridmap.h"
 #include "operations/copy/detail/storereader.h"
@@ -155,6 +156,18 @@ void WarnOfMiss(const SourceFile& oFile, const GeocodingInfo& oPlace, const Grid
         detail::Target::Warn(oFile.GetName() + ": the grid lies outside of the image; no pixel has a source");
 }
 
+// Reals have "nan" for what the mask of a channel alone takes away, a file with a no-data value has that.
+void WarnOfChannelMasks(const SourceFile& oFile, const std::vector<unsigned int>& oChannels)
+{
+    const auto poValidity = oFile.MakeValidity(oChannels);
+    const bool bInteger = std::any_of(oChannels.begin(), oChannels.end(),
+                                      [&](unsigned int nChannel) { return !oFile.GetType(nChannel).IsReal(); });
+    if (oChannels.size() > 1 && bInteger && poValidity->HasChannelMasks() && !poValidity->HasNoData())
+        detail::Target::Warn(oFile.GetName() +
+                             ": where the mask of a channel alone takes its pixels away they become 0, "
+                             "which is not marked; give a --no-data value for them");
+}
+
 void CheckRequest(const WarpRequest& oRequest)
 {
     const auto IsStep = [](double n)
@@ -205,6 +218,8 @@ WarpResult Warp(const WarpRequest& oRequest, const TargetForm& oForm, const Prog
     const Grid oGrid =
         oRequest.like.empty() ? MakeGrid(oRequest, oFile, oPlacement.geocoding) : GridLike(oFile, oRequest.like);
     WarnOfMiss(oFile, oPlacement.geocoding, oGrid);
+    if (!oRequest.noData)
+        WarnOfChannelMasks(oFile, oChannels);
     WarpResult oResult{oGrid.width, oGrid.height, oGrid.geocoding};
     const std::unique_ptr<krv::gobs::PCT> poTable =
         oChannels.size() == 1 ? FindPCT(oFile.GetDataset(), oChannels.front()) : nullptr;

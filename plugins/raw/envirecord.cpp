@@ -68,7 +68,10 @@ std::vector<std::string> ReadPerChannel(const HeaderText& oHeader, const char* p
 
 void ReadDefaults(const HeaderText& oHeader, AuxiliaryData& oTags)
 {
-    const auto oBands = oHeader.GetList(DEFAULT_KEY);
+    std::vector<std::string> oBands = oHeader.GetList(DEFAULT_KEY);
+    for (std::string& band : oBands) // some write 29.0
+        if (const auto oNumber = ParseReal(band); oNumber && *oNumber == std::trunc(*oNumber))
+            band = krv::NumberText(*oNumber);
     for (std::size_t n = 0; oBands.size() == 3 && n < 3; ++n)
         oTags.SetFileMetadataValue(DEFAULT_COLOURS[n], oBands[n]);
     if (oBands.size() == 1)
@@ -247,7 +250,9 @@ int FindCode(const MapInfo& oInfo)
         return 0;
     const int nZone = krv::ParseNumber<int>(oInfo.moRest[0]).value_or(0);
     const std::string side = Bare(oInfo.moRest[1]);
-    const int nBase = side == "NORTH" ? pDatum->mnNorth : side == "SOUTH" ? pDatum->mnSouth : 0;
+    const int nBase = side == "NORTH" || side == "N"   ? pDatum->mnNorth
+                      : side == "SOUTH" || side == "S" ? pDatum->mnSouth
+                                                       : 0;
     return nBase != 0 && nZone >= pDatum->mnFirstZone && nZone <= pDatum->mnLastZone ? nBase + nZone : 0;
 }
 

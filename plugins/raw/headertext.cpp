@@ -18,10 +18,11 @@ std::string_view Trim(std::string_view text)
                                             : text.substr(nFirst, text.find_last_not_of(BLANKS) - nFirst + 1);
 }
 
-// A line with its end; the text begins behind it then.
+// A line with its end, any of the three that there are; the text begins behind it then.
 std::string_view TakeLine(std::string_view& text)
 {
-    const std::size_t nEnd = std::min(text.find('\n'), text.size() - 1) + 1;
+    std::size_t nEnd = std::min(text.find_first_of("\r\n"), text.size() - 1) + 1;
+    nEnd += text.substr(nEnd - 1).starts_with("\r\n") ? 1 : 0;
     const std::string_view line = text.substr(0, nEnd);
     text.remove_prefix(nEnd);
     return line;
@@ -58,7 +59,9 @@ HeaderText::HeaderText(std::string_view text)
         if (!Trim(line).starts_with(';') && nSign != std::string_view::npos)
         {
             oEntry.moKey = Trim(line.substr(0, nSign));
-            if (Trim(line.substr(nSign + 1)).starts_with('{') && line.find('}', nSign) == std::string_view::npos)
+            const std::string_view value = Trim(line.substr(nSign + 1));
+            const bool bNext = value.empty() && Trim(text).starts_with('{');
+            if (bNext || (value.starts_with('{') && line.find('}', nSign) == std::string_view::npos))
                 while (!text.empty() && TakeLine(text).find('}') == std::string_view::npos)
                     continue;
         }

@@ -21,7 +21,9 @@ namespace
 const std::string& GetMainName(const RawFiles& oFiles)
 {
     if (oFiles.moData.empty())
-        throw FileFormatException(oFiles.moHeader, oFiles.moHeader + ": no data file lies beside the header");
+        throw FileFormatException(oFiles.moHeader, oFiles.moHeader +
+                                                       ": no data file lies beside the header under a usual name; "
+                                                       "open the data file by its own");
     return oFiles.moData;
 }
 

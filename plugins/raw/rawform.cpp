@@ -129,10 +129,13 @@ std::optional<std::uint64_t> RawForm::CountBytes() const
     const std::uint64_t nValueBytes = moType.GetValueBits() / 8;
     const std::uint64_t nPixels = std::uint64_t{mnWidth} * mnHeight;
     constexpr std::uint64_t MOST = std::uint64_t{1} << 62;
+    // Of rows and gaps between channels below 2^44.
+    const std::uint64_t nParts = meInterleave == Interleave::eBand ? mnChannels : 1;
+    if (mnRowBytes > MOST / mnHeight / nParts || mnOffset > MOST)
+        return std::nullopt;
     if (mnRowBytes != 0)
-        return mnRowBytes > MOST / mnHeight || mnOffset > MOST ? std::nullopt
-                                                               : std::optional(mnRowBytes * mnHeight + mnOffset);
-    if (nPixels > MOST / (nValueBytes * mnChannels) || mnOffset > MOST)
+        return mnRowBytes * mnHeight * nParts + (nParts - 1) * mnBandGap + mnOffset;
+    if (nPixels > MOST / (nValueBytes * mnChannels))
         return std::nullopt;
     return nPixels * nValueBytes * mnChannels + mnOffset;
 }
@@ -155,9 +158,11 @@ std::vector<support::PlainSource::Placement> RawForm::PlacePlanes() const
         return PlainSource::PlacePlanes(MakeLayout(), mnOffset,
                                         meInterleave == Interleave::eLine ? PlainSource::Order::eLine
                                                                           : PlainSource::Order::eBand);
+    const std::uint64_t nApart =
+        meInterleave == Interleave::eBand ? mnRowBytes * mnHeight + mnBandGap : mnChannelRowBytes;
     std::vector<PlainSource::Placement> oPlacements;
     for (unsigned int nChannel = 0; nChannel < (meInterleave == Interleave::ePixel ? 1 : mnChannels); ++nChannel)
-        oPlacements.push_back({mnOffset + nChannel * mnChannelRowBytes, mnRowBytes});
+        oPlacements.push_back({mnOffset + nChannel * nApart, mnRowBytes});
     return oPlacements;
 }
 

@@ -32,9 +32,11 @@ struct RawForm
     Interleave meInterleave = Interleave::eBand;
     bool mbBigEndian = false;
     std::uint64_t mnOffset = 0;
-    // Of line-interleaved files with gaps: bytes of a row of one channel, and of all. 0: none but the values.
+    // Of files with gaps: the bytes of a row of one channel, those from one row of a channel to the next, and those
+    // between the channels of eBand. 0: none but the values.
     std::uint64_t mnChannelRowBytes = 0;
     std::uint64_t mnRowBytes = 0;
+    std::uint64_t mnBandGap = 0;
 
     // Up to the end of the last value. No value for more than any file holds.
     std::optional<std::uint64_t> CountBytes() const;

@@ -1,7 +1,7 @@
 #include "plugins/raw/rawimage.h"
 
 #include "plugins/raw/envirecord.h"
-#include "plugins/support/file/file.h"
+#include "plugins/support/sidecar/sidecarfile.h"
 #include "toolkit/core/lettercase.h"
 #include "toolkit/core/numbertext.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -10,6 +10,7 @@
 
 #include <algorithm>
 #include <climits>
+#include <initializer_list>
 #include <map>
 #include <sstream>
 #include <vector>
@@ -18,7 +19,6 @@ namespace krv::plugins::raw
 {
 
 using krv::ogc::cs::GeocodingInfo;
-using support::File;
 
 namespace
 {
@@ -28,7 +28,7 @@ constexpr std::uint64_t MOST_SURPLUS = 4096;
 // Data files of a header are tried by these endings when the header is named.
 constexpr const char* DATA_ENDINGS[] = {"",    "img", "dat", "bin", "raw", "bsq", "bil", "bip", "envi", "cub",
                                         "flt", "slc", "rdr", "dem", "grd", "int", "cor", "unw", "lin"};
-constexpr const char* ESRI_ENDINGS[] = {"BIL", "BIP", "BSQ", "FLT"};
+constexpr const char* ESRI_ENDINGS[] = {"BIL", "BIP", "BSQ", "FLT", "DEM"};
 
 std::optional<std::uint64_t> FindSize(const std::string& fileName)
 {
@@ -61,15 +61,12 @@ std::string GetStem(const std::string& fileName)
 // A text of a sensible size; no value for any other file, and for one that is none.
 std::optional<std::string> ReadText(const std::string& fileName)
 {
-    const auto oSize = FindSize(fileName);
-    if (!oSize || *oSize > MOST_HEADER_BYTES)
+    if (!FindSize(fileName))
         return std::nullopt;
     try
     {
-        const File oFile(fileName, File::Mode::eRead);
-        std::string text(MOST_HEADER_BYTES < oFile.GetSize() ? 0 : oFile.GetSize(), '\0');
-        text.resize(oFile.ReadUpTo(0, text.data(), text.size()));
-        return text.find('\0') == std::string::npos ? std::optional(text) : std::nullopt;
+        std::string text = support::ReadSidecar(fileName, MOST_HEADER_BYTES);
+        return text.find('\0') == std::string::npos ? std::optional(std::move(text)) : std::nullopt;
     }
     catch (const FileException&)
     {
@@ -92,6 +89,19 @@ std::optional<RawFiles> TakeHeader(const std::string& header, const std::string&
     return std::nullopt;
 }
 
+// Whether the header is of a file of so many bytes, or says what is wrong with it when it is opened.
+bool MayFit(const RawFiles& oFiles, std::uint64_t nBytes)
+{
+    try
+    {
+        return IsSizeOf(ReadForm(oFiles), nBytes);
+    }
+    catch (const FileFormatException&)
+    {
+        return true;
+    }
+}
+
 // By the name of the header. Where no data file of a fitting size lies beside it, opening says so.
 std::optional<RawFiles> FindData(const std::string& header)
 {
@@ -111,15 +121,8 @@ std::optional<RawFiles> FindData(const std::string& header)
                 continue;
             if (!oFirst)
                 oFirst = oFiles;
-            try
-            {
-                if (IsSizeOf(ReadForm(*oFiles), *oSize))
-                    return oFiles;
-            }
-            catch (const FileFormatException&)
-            {
-                return oFiles; // says what is wrong when it is opened
-            }
+            if (MayFit(*oFiles, *oSize))
+                return oFiles;
         }
     if (oFirst || !bEnvi)
         return oFirst;
@@ -188,7 +191,9 @@ RawImage ReadTile(RawFiles oFiles)
 std::map<std::string, std::string> ParseKeywords(std::string_view text)
 {
     std::map<std::string, std::string> oKeywords;
-    std::istringstream oLines{std::string(text)};
+    std::string lines(text);
+    std::replace(lines.begin(), lines.end(), '\r', '\n');
+    std::istringstream oLines(lines);
     for (std::string line; std::getline(oLines, line);)
     {
         std::istringstream oWords(line);
@@ -248,7 +253,9 @@ krv::gobs::DataType EsriHeader::ReadType() const
 {
     const bool bFloat = moEnding == "FLT";
     const std::uint64_t nBits = GetNumber("NBITS", bFloat ? 32 : 8, 1, 64);
-    const std::string type = Get("PIXELTYPE", bFloat ? "FLOAT" : "UNSIGNEDINT");
+    // A value below 0 that stands for nothing is one of the type.
+    const bool bSigned = GetReal("NODATA").value_or(0) < 0;
+    const std::string type = Get("PIXELTYPE", bFloat ? "FLOAT" : bSigned ? "SIGNEDINT" : "UNSIGNEDINT");
     using namespace krv::gobs;
     static constexpr struct
     {
@@ -262,7 +269,8 @@ krv::gobs::DataType EsriHeader::ReadType() const
     for (const auto& oType : TYPES)
         if (oType.mnBits == nBits && type == oType.mpType)
             return oType.meCode;
-    Refuse("NBITS", std::to_string(nBits), "8, 16, 32 or 64 bits of UNSIGNEDINT, SIGNEDINT or FLOAT, but " + type);
+    Refuse("NBITS", std::to_string(nBits) + ", PIXELTYPE " + type,
+           "8, 16, 32 or 64 bits of UNSIGNEDINT or SIGNEDINT, or 32 or 64 of FLOAT");
 }
 
 bool EsriHeader::ReadByteOrder() const
@@ -283,12 +291,14 @@ void EsriHeader::ReadGaps(RawForm& oForm) const
     const bool bPixel = oForm.meInterleave == Interleave::ePixel;
     const std::uint64_t nLeast = bPixel ? nValues * oForm.mnChannels : nValues;
     oForm.mnChannelRowBytes = GetNumber("BANDROWBYTES", nValues, nValues, INT64_MAX >> 20);
+    if (oForm.meInterleave == Interleave::eBand)
+    {
+        oForm.mnBandGap = GetNumber("BANDGAPBYTES", 0, 0, INT64_MAX >> 20);
+        oForm.mnRowBytes = oForm.mnChannelRowBytes;
+        return;
+    }
     const std::uint64_t nUsual = bPixel ? nLeast : oForm.mnChannelRowBytes * oForm.mnChannels;
     oForm.mnRowBytes = GetNumber("TOTALROWBYTES", nUsual, nUsual, INT64_MAX >> 20);
-    if (oForm.mnRowBytes == nUsual && oForm.mnChannelRowBytes == nValues)
-        oForm.mnRowBytes = oForm.mnChannelRowBytes = 0;
-    else if (oForm.meInterleave == Interleave::eBand)
-        throw FileFormatException(moName, moName + ": bands one after the other with gaps between rows cannot be read");
 }
 
 RawForm EsriHeader::ReadForm() const
@@ -307,8 +317,6 @@ RawForm EsriHeader::ReadForm() const
     if (layout != "BIL" && layout != "BIP" && layout != "BSQ")
         Refuse("LAYOUT", layout, "BIL, BIP or BSQ");
     oForm.meInterleave = layout == "BIL" ? Interleave::eLine : layout == "BIP" ? Interleave::ePixel : Interleave::eBand;
-    if (GetNumber("BANDGAPBYTES", 0, 0, INT64_MAX) != 0)
-        throw FileFormatException(moName, moName + ": gaps between bands cannot be read");
     ReadGaps(oForm);
     return oForm;
 }
@@ -316,17 +324,22 @@ RawForm EsriHeader::ReadForm() const
 // The centre of the first pixel, or a corner or centre at the lower left.
 std::optional<GeocodingInfo> EsriHeader::ReadGeocoding(const RawForm& oForm) const
 {
+    const auto FindFirst = [this](std::initializer_list<const char*> oKeys)
+    {
+        std::optional<double> oValue;
+        for (const char* const pKey : oKeys)
+            oValue = oValue ? oValue : GetReal(pKey);
+        return oValue;
+    };
+    const auto oStepX = FindFirst({"XDIM", "DX", "CELLSIZE"}), oStepY = FindFirst({"YDIM", "DY", "CELLSIZE"});
+    const double nStepX = oStepX.value_or(1), nStepY = oStepY.value_or(1);
     std::optional<GeocodingInfo> oInfo;
-    const auto oCell = GetReal("CELLSIZE");
-    const double nStepX = GetReal("XDIM").value_or(oCell.value_or(1)),
-                 nStepY = GetReal("YDIM").value_or(oCell.value_or(1));
     if (const auto oX = GetReal("ULXMAP"), oY = GetReal("ULYMAP"); oX && oY)
         oInfo = GeocodingInfo(*oX - nStepX / 2, nStepX, 0, *oY + nStepY / 2, 0, -nStepY);
-    for (const auto& [pX, pY, nShift] :
-         {std::tuple{"XLLCORNER", "YLLCORNER", 0.0}, std::tuple{"XLLCENTER", "YLLCENTER", 0.5}})
-        if (const auto oX = GetReal(pX), oY = GetReal(pY); oX && oY && oCell)
-            oInfo =
-                GeocodingInfo(*oX - nShift * *oCell, *oCell, 0, *oY + (oForm.mnHeight - nShift) * *oCell, 0, -*oCell);
+    const double nShiftX = GetReal("XLLCENTER") ? 0.5 : 0, nShiftY = GetReal("YLLCENTER") ? 0.5 : 0;
+    if (const auto oX = FindFirst({"XLLCENTER", "XLLCORNER"}), oY = FindFirst({"YLLCENTER", "YLLCORNER"});
+        oX && oY && oStepX && oStepY)
+        oInfo = GeocodingInfo(*oX - nShiftX * nStepX, nStepX, 0, *oY + (oForm.mnHeight - nShiftY) * nStepY, 0, -nStepY);
     return oInfo && oInfo->IsInvertible() ? oInfo : std::nullopt;
 }
 
@@ -383,10 +396,18 @@ std::optional<RawFiles> FindFiles(const std::string& fileName)
     if (!oSize)
         return std::nullopt;
     const std::string stem = GetStem(fileName);
+    std::optional<RawFiles> oFirst;
     for (const std::string& base : {fileName, stem})
         for (const char* const pEnding : {".hdr", ".HDR"})
-            if (auto oFiles = TakeHeader(base + pEnding, fileName))
+        {
+            auto oFiles = TakeHeader(base + pEnding, fileName);
+            if (oFiles && MayFit(*oFiles, *oSize))
                 return oFiles;
+            if (!oFirst)
+                oFirst = std::move(oFiles);
+        }
+    if (oFirst)
+        return oFirst;
     if (FindTileSide(*oSize) != 0 && ParseTileName(fileName))
         return RawFiles{RawKind::eHeight, fileName, {}, {}};
     return std::nullopt;

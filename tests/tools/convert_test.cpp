@@ -491,6 +491,54 @@ TEST(Convert, BitmapsAreCut)
     EXPECT_TRUE(dynamic_cast<krv::datasources::IBitmapDataset&>(*poStack).GetBitmapList().empty());
 }
 
+// Each channel keeps the pixels that its own mask leaves, under its new number, wherever the format keeps masks.
+TEST(Convert, MasksOfChannelsFollowThem)
+{
+    const TempFolder oFolder;
+    const std::string file = oFolder.File("file.img");
+    krv::test::WriteDemoFile(oFolder.File("a.dem"), 60, 40, {krv::gobs::eDT_8U, krv::gobs::eDT_8U, krv::gobs::eDT_8U});
+    ASSERT_EQ(RunConvert({oFolder.File("a.dem"), file}).code, 0);
+    const auto poFile = OpenFile(file);
+    auto& oBitmaps = dynamic_cast<krv::datasources::IBitmapDataset&>(*poFile);
+    for (const unsigned int nChannel : {1U, 2U, 3U})
+    {
+        const unsigned int nMask = oBitmaps.CreateBitmap();
+        oBitmaps.SetBitmapMetadata(nMask, {{krv::datasources::VALIDITY_OF_CHANNEL, std::to_string(nChannel)}});
+        krv::datasources::BasicWriter oWriter(&oBitmaps, {nMask});
+        const std::unique_ptr<krv::gobs::Raster> poRaster(oWriter.ReadRaster(0, 0, 60, 40));
+        std::fill_n(poRaster->GetBuffer(), std::size_t{100} * nChannel, static_cast<unsigned char>(1));
+        oWriter.WriteRaster(poRaster.get());
+    }
+    poFile->Close();
+    const std::pair<Texts, std::vector<int>> COPIES[] = {{{"--channels", "3,1"}, {300, 100}},
+                                                         {{"--channels", "2", "--window", "0,0,60,3"}, {180}},
+                                                         {{"--type", "16U", "--scale", "0,9"}, {100, 200, 300}}};
+    const auto CompareValid = [](const std::string& copy, const std::vector<int>& oValid)
+    {
+        const auto oChannels = krv::test::RunKrv({"stats", copy, "--json"}).Json()["channels"];
+        ASSERT_EQ(oChannels.size(), oValid.size());
+        for (std::size_t n = 0; n < oValid.size(); ++n)
+            EXPECT_EQ(oChannels[n]["valid"], oValid[n]) << copy << ", channel " << n;
+    };
+    for (const char* const pName : {"copy.tif", "copy.krv", "copy.img", "copy.jp2", "copy.j2k", "copy.demo"})
+        for (const auto& [oOptions, oValid] : COPIES)
+        {
+            SCOPED_TRACE(oOptions.back());
+            Texts oArguments = {file, oFolder.File(pName)};
+            oArguments.insert(oArguments.end(), oOptions.begin(), oOptions.end());
+            const auto oRun = RunConvert(oArguments);
+            EXPECT_TRUE(oRun.code == 0 && oRun.errors.empty()) << pName << ": " << oRun.errors;
+            CompareValid(oFolder.File(pName), oValid);
+        }
+    // So do the pixels of another grid, where a value stands for those that are not valid.
+    const std::string warped = oFolder.File("warped.tif");
+    ASSERT_EQ(krv::test::RunKrv({"edit", file, "--origin", "0,40", "--pixel-size", "1"}).code, 0);
+    EXPECT_NE(krv::test::RunKrv({"warp", file, warped, "--resolution", "1"}).errors.find("mask of a channel"),
+              std::string::npos);
+    ASSERT_EQ(krv::test::RunKrv({"warp", file, warped, "--resolution", "1", "--no-data", "0"}).code, 0);
+    CompareValid(warped, {100, 200, 300});
+}
+
 TEST(Convert, FailuresLeaveNothingBehindAndTheOldFileAsItWas)
 {
     const TempFolder oFolder;

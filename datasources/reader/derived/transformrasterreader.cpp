@@ -75,6 +75,9 @@ public:
             mpoTest = krv::gobs::MakeSampleTest(oReader.GetDataType(), oNumbers, true);
         for (unsigned int n = 0; oReader.GetDataType().IsComplex() && n < mnChannels; ++n)
             AddComplex(oNumbers[n], n);
+        for (unsigned int n = 0; n < mnChannels; ++n)
+            if (const krv::gobs::IMaskBuilder* const poMask = moValidity.GetChannelMask(n))
+                moBackgrounds.push_back({n, poMask});
     }
 
     IRasterReader& GetReader() const { return moReader; }
@@ -100,17 +103,19 @@ public:
     }
 
 private:
-    struct ComplexChannel
+    // Where a channel alone has no data.
+    struct ChannelBackground
     {
         unsigned int mnChannel;
-        std::unique_ptr<const krv::gobs::IMaskBuilder> mpoBackground;
+        const krv::gobs::IMaskBuilder* mpoBuilder;
     };
 
     void AddComplex(const std::optional<krv::gobs::SampleValue>& oNumber, unsigned int nChannel)
     {
         const auto oValue = oNumber.value_or(krv::gobs::SampleValue::FromReal(std::nan("")));
         const krv::gobs::ExactMaskDecision oDecision(krv::gobs::eAnyChannel, {oValue}, {nChannel + 1}, true);
-        moComplex.push_back({nChannel, std::make_unique<krv::gobs::MaskDecisionBuilder>(&oDecision)});
+        moComplex.push_back(std::make_unique<krv::gobs::MaskDecisionBuilder>(&oDecision));
+        moBackgrounds.push_back({nChannel, moComplex.back().get()});
     }
 
     static bool IsFull(const Mask& oMask) { return oMask.CountSet() == oMask.GetFullWidth() * oMask.GetFullHeight(); }
@@ -122,7 +127,7 @@ private:
         const std::size_t nValues = nPixels * mnChannels;
         const bool bMasked = poMask != nullptr && !IsFull(*poMask);
         const bool bValues = mpoTest != nullptr && mpoTest->FindsAny(oPixels.GetBuffer(), nValues);
-        if (!bMasked && !bValues && moComplex.empty())
+        if (!bMasked && !bValues && moBackgrounds.empty())
             return nullptr;
         if (bValues)
         {
@@ -132,8 +137,8 @@ private:
         else
             moValid.assign(nValues, 1);
         bool bAny = bMasked || bValues;
-        for (const ComplexChannel& oChannel : moComplex)
-            bAny = MarkComplex(oPixels, oChannel) || bAny;
+        for (const ChannelBackground& oChannel : moBackgrounds)
+            bAny = MarkChannel(oPixels, oChannel) || bAny;
         for (std::size_t n = 0; bMasked && n < nPixels; ++n)
         {
             if ((poMask->GetBits()[n / 8] & 128u >> n % 8) == 0)
@@ -142,9 +147,9 @@ private:
         return bAny ? moValid.data() : nullptr;
     }
 
-    bool MarkComplex(const Raster& oPixels, const ComplexChannel& oChannel)
+    bool MarkChannel(const Raster& oPixels, const ChannelBackground& oChannel)
     {
-        const std::unique_ptr<Mask> poBackground(oChannel.mpoBackground->BuildMask(oPixels));
+        const std::unique_ptr<Mask> poBackground(oChannel.mpoBuilder->BuildMask(oPixels));
         if (poBackground->CountSet() == 0)
             return false;
         const std::size_t nPixels = oPixels.GetFullWidth() * oPixels.GetFullHeight();
@@ -162,7 +167,8 @@ private:
     ReaderValidity moValidity;
     unsigned int mnChannels;
     std::unique_ptr<const krv::gobs::ISampleTest> mpoTest; // of plain types
-    std::vector<ComplexChannel> moComplex;
+    std::vector<std::unique_ptr<const krv::gobs::IMaskBuilder>> moComplex;
+    std::vector<ChannelBackground> moBackgrounds; // of moComplex and moValidity
     HBlock mpoPixels;
     std::vector<unsigned char> moValid;
 };

@@ -131,17 +131,24 @@ std::unique_ptr<Mask> ScaledReader::ReadValid(Raster& oRaster)
                    oRaster.GetContext());
     oSource.ReadRaster(&oPixels);
     std::unique_ptr<Mask> poValid(mbValidity ? mpoValidity->BuildMask(oPixels) : nullptr);
+    std::vector<std::unique_ptr<Mask>> oEmpty;
+    for (std::size_t c = 0; c < moChannels.size(); ++c)
+    {
+        const auto* const poMask = mpoValidity->GetChannelMask(c);
+        oEmpty.emplace_back(poMask != nullptr ? poMask->BuildMask(oPixels) : nullptr);
+    }
     krv::gobs::VisitPartType(oPixels.GetDataType(),
                              [&]<class From>(std::type_identity<From>)
                              {
                                  krv::gobs::VisitPartType(moType, [&]<class To>(std::type_identity<To>)
-                                                          { Fill<From, To>(oPixels, poValid.get(), oRaster); });
+                                                          { Fill<From, To>(oPixels, poValid.get(), oEmpty, oRaster); });
                              });
     return poValid;
 }
 
 template <class From, class To>
-void ScaledReader::Fill(const Raster& oFrom, const Mask* poValid, Raster& oTo) const
+void ScaledReader::Fill(const Raster& oFrom, const Mask* poValid, const std::vector<std::unique_ptr<Mask>>& oEmpty,
+                        Raster& oTo) const
 {
     const auto* pFrom = reinterpret_cast<const From*>(oFrom.GetBuffer());
     auto* pTo = reinterpret_cast<To*>(oTo.GetBuffer());
@@ -153,11 +160,16 @@ void ScaledReader::Fill(const Raster& oFrom, const Mask* poValid, Raster& oTo) c
     const std::uint64_t nPixels = oFrom.GetFullWidth() * oFrom.GetFullHeight();
     for (std::uint64_t nPixel = 0; nPixel < nPixels; ++nPixel)
     {
-        const bool bValid = poValid == nullptr || (poValid->GetBits()[nPixel / 8] & 128u >> nPixel % 8) != 0;
+        const auto IsSet = [nPixel](const Mask& oMask)
+        {
+            return (oMask.GetBits()[nPixel / 8] & 128u >> nPixel % 8) != 0;
+        };
+        const bool bValid = poValid == nullptr || IsSet(*poValid);
         for (std::size_t c = 0; c < moChannels.size(); ++c, ++pFrom, ++pTo)
         {
             const double nValue = moChannels[c].line(static_cast<double>(*pFrom));
-            *pTo = !bValid || oMatches[c].Matches(*pFrom) || std::isnan(nValue)
+            *pTo = !bValid || (oEmpty[c] != nullptr && IsSet(*oEmpty[c])) || oMatches[c].Matches(*pFrom) ||
+                           std::isnan(nValue)
                        ? NOTHING
                        : krv::raster::ConvertValue<To>(std::clamp(nValue, mnLow, mnHigh));
         }

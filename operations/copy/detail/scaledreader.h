@@ -41,8 +41,10 @@ private:
         OptionalNoData noData;
     };
 
+    // poValid: the pixels of which some channel is valid; null: all. oEmpty: those of which a channel is not; or null.
     template <class From, class To>
-    void Fill(const krv::gobs::Raster& oFrom, const krv::gobs::Mask* poValid, krv::gobs::Raster& oTo) const;
+    void Fill(const krv::gobs::Raster& oFrom, const krv::gobs::Mask* poValid,
+              const std::vector<std::unique_ptr<krv::gobs::Mask>>& oEmpty, krv::gobs::Raster& oTo) const;
     void MakeRecord(const SourceFile& oFile, const std::vector<unsigned int>& oChannels, bool bUnscale);
 
     krv::gobs::DataType moType;

@@ -17,7 +17,7 @@ constexpr std::uint64_t MOST_BYTES = std::uint64_t{1} << 62;
 // What is picked apart piece by piece stays in the processor's second cache, beside what is made of it.
 constexpr std::size_t SLICE_BYTES = std::size_t{128} << 10;
 // What is turned round in its place has that cache for itself.
-constexpr std::size_t SWAPPED_BYTES = std::size_t{256} << 10;
+constexpr std::size_t SWAPPED_BYTES = std::size_t{384} << 10;
 // A call to the system costs about as much as copying this many bytes.
 constexpr std::uint64_t CALL_BYTES = 4096;
 constexpr std::size_t TILE_BYTES = std::size_t{1} << 20;

@@ -35,14 +35,20 @@ std::vector<unsigned int> FindModelSidecars(const std::string& fileName)
     return oNumbers;
 }
 
-krv::mathmodel::RpcCoefficients ReadModelSidecar(const std::string& fileName, unsigned int nModel)
+std::string FindModelSidecar(const std::string& fileName, unsigned int nModel)
 {
     for (const Kind& oKind : KINDS)
-    {
-        const std::string sidecar = oKind.mnModel == nModel ? FindSidecar(fileName, oKind.mpEnding) : std::string();
-        if (!sidecar.empty())
+        if (oKind.mnModel == nModel)
+            return FindSidecar(fileName, oKind.mpEnding);
+    return {};
+}
+
+krv::mathmodel::RpcCoefficients ReadModelSidecar(const std::string& fileName, unsigned int nModel)
+{
+    const std::string sidecar = FindModelSidecar(fileName, nModel);
+    for (const Kind& oKind : KINDS)
+        if (oKind.mnModel == nModel && !sidecar.empty())
             return oKind.mpParse(ReadSidecar(sidecar, MAXIMUM_BYTES), sidecar);
-    }
     throw DataException(fileName + ": there is no sensor model " + std::to_string(nModel));
 }
 

@@ -16,6 +16,9 @@ inline constexpr unsigned int FIRST_OWN_MODEL = 3;
 // fileName: of the image. Looks for names; reads nothing.
 std::vector<unsigned int> FindModelSidecars(const std::string& fileName);
 
+// The text of a number; empty when there is none.
+std::string FindModelSidecar(const std::string& fileName, unsigned int nModel);
+
 // Throws FileFormatException that names the sidecar when it is no model, and DataException when there is none of that
 // number.
 krv::mathmodel::RpcCoefficients ReadModelSidecar(const std::string& fileName, unsigned int nModel);

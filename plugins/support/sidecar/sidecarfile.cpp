@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <filesystem>
+#include <string_view>
 #include <utility>
 
 #include <sys/stat.h>
@@ -15,6 +16,8 @@ namespace krv::plugins::support
 
 namespace
 {
+
+constexpr std::string_view UTF8_MARK = "\xEF\xBB\xBF"; // some editors begin texts with it
 
 // The names that a file beside another one may have, each once.
 std::vector<std::string> ListNames(const std::string& base, const std::string& ending)
@@ -86,6 +89,8 @@ std::string ReadSidecar(const std::string& sidecar, std::size_t nMaximum)
                                                std::to_string(nMaximum) + " are read");
     std::string text(static_cast<std::size_t>(oFile.GetSize()), '\0');
     oFile.Read(0, text.data(), text.size());
+    if (text.starts_with(UTF8_MARK))
+        text.erase(0, UTF8_MARK.size());
     return text;
 }
 

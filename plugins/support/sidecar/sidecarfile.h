@@ -24,9 +24,8 @@ std::string FindAppended(const std::string& fileName, const std::string& ending)
 // in other letters that is another file's is not among them.
 std::vector<std::string> ListCompanions(const std::string& fileName);
 
-// All of a sidecar. Throws FileFormatException when it has more than nMaximum bytes, and what opening and reading
-// throw.
-// nMaximum: bytes; the file may be anybody's.
+// All of a sidecar but for the byte order mark before its text. Throws FileFormatException when it has more than
+// nMaximum bytes, and what opening and reading throw.
 std::string ReadSidecar(const std::string& sidecar, std::size_t nMaximum);
 
 } // namespace krv::plugins::support

@@ -355,7 +355,7 @@ std::string Sidecars::DescribeMask(unsigned int nMask)
     if (IsZone(nMask))
         return "Bitmap " + std::to_string(nMask);
     const unsigned int nChannel = HasMask(nMask) ? FindMaskChannel(nMask) : 0;
-    return nChannel == 0 ? "" : "Validity of channel " + std::to_string(nChannel);
+    return nChannel == 0 ? "" : krv::datasources::NameChannelMask(nChannel);
 }
 
 MetadataMap Sidecars::GetMaskTags(unsigned int nMask)
@@ -621,8 +621,19 @@ std::vector<krv::datasources::Sidecar> Sidecars::List(const Needs& oNeeds)
     Add(FindWorldFile(), "geocoding", oNeeds.mbGeocoding && !oAuxXml.GetGeocoding(), false);
     Add(FindSidecar(moFileName, PROJECTION), "reference system", oNeeds.mbCRS && oAuxXml.GetCRS().empty(), false);
     Add(*moMaskName, "mask", oNeeds.mbMask && !moMasks.empty(), true);
-    for (const char* const pEnding : {"_RPC.TXT", ".rpb"})
-        Add(FindSidecar(moFileName, pEnding), "sensor model", oNeeds.mbTags, false);
+    for (const unsigned int nModel : FindModelSidecars(moFileName))
+    {
+        const std::string model = FindModelSidecar(moFileName, nModel);
+        try
+        {
+            ReadModelSidecar(moFileName, nModel);
+        }
+        catch (const krv::Exception& oError)
+        {
+            moTroubles.emplace(model, oError.what());
+        }
+        Add(model, "sensor model", oNeeds.mbTags, false);
+    }
     const std::string levels = FindAppended(moFileName, LEVELS_ENDING);
     if (!levels.empty() && !HasUsableLevels(moFileName))
         moTroubles.emplace(levels, "it holds no levels of the image");

@@ -84,6 +84,8 @@ std::string OpenError(const std::string& header, std::size_t nBytes)
 
 TEST(RawFormat, HeadersAreHostile)
 {
+    std::string returns = BASE;
+    std::replace(returns.begin(), returns.end(), '\n', '\r');
     const std::tuple<std::string, std::size_t, std::string> HEADERS[] = {
         {BASE, 80, ""},
         {BASE, 90, ""},
@@ -109,6 +111,9 @@ TEST(RawFormat, HeadersAreHostile)
         {BASE + "band names = {a, b", 80, ""},
         {BASE + "Samples=5\n", 80, ""},
         {BASE + "Samples=4\n", 80, "file: FILE.hdr: \"samples\" stands there twice, with different values"},
+        {"\xEF\xBB\xBF" + BASE, 80, ""},
+        {returns, 80, ""},
+        {"ENVI\nsamples =\n{5}\nlines=4\ndata type=2\n", 40, ""},
         {"ENVIsamples = 5\n", 80, "file: "},
         {"nothing of this kind\n", 80, "file: "},
         {BASE + std::string(1, '\0'), 80, "file: "}};
@@ -153,11 +158,41 @@ TEST(RawFormat, FilesBelongToTheirHeaders)
     oFolder.Write("y.hdr", "no header");
     oFolder.Write("y.img", std::string(80, 'q'));
     oFolder.Write("z.hdr", BASE);
-    for (const char* pName : {"x.img", "x.dat", "x", "x.IMG", "x.hdr", "y.img", "y.img.hdr"})
+    oFolder.Write("w.dat.hdr", With("lines = 100\n"));
+    oFolder.Write("w.hdr", BASE);
+    oFolder.Write("w.dat", std::string(80, 'r'));
+    for (const char* pName : {"x.img", "x.dat", "x", "x.IMG", "x.hdr", "y.img", "y.img.hdr", "w.dat"})
         EXPECT_EQ(krv::test::Error([&] { Open(oFolder.File(pName)); }), "") << pName;
     EXPECT_EQ(Open(oFolder.File("y.img.hdr"))->GetName(), oFolder.File("y.img"));
     for (const char* pName : {"x.tif", "x.txt", "y.hdr", "z.hdr", "none.img"})
         EXPECT_NE(krv::test::Error([&] { Open(oFolder.File(pName)); }), "") << pName;
+}
+
+// The last channel of each.
+TEST(RawFormat, EsriHeadersSayWhereValuesLie)
+{
+    using namespace krv::gobs;
+    const std::string size = "NROWS 2\nNCOLS 2\nNBANDS 2\n";
+    const std::tuple<std::string, std::string, DataType, std::string> FILES[] = {
+        {"\xEF\xBB\xBF"
+         "BYTEORDER M\rNROWS 1\rNCOLS 2\rNBITS 16\r",
+         std::string("\0\1\2\0", 4), eDT_16U, std::string("\1\0\0\2", 4)},
+        {"NROWS 1\nNCOLS 4\nNODATA -1\n", "abcd", eDT_8S, "abcd"},
+        {size + "LAYOUT BSQ\nTOTALROWBYTES 2\nBANDGAPBYTES 3\n", "abcd...efgh", eDT_8U, "efgh"},
+        {size + "LAYOUT BSQ\nBANDROWBYTES 3\n", "ab.cd.ef.gh.", eDT_8U, "efgh"},
+        {size + "LAYOUT BIL\nBANDROWBYTES 3\nTOTALROWBYTES 7\n", "ab.ef.:cd.gh.:", eDT_8U, "efgh"},
+        {size + "LAYOUT BIP\nTOTALROWBYTES 5\n", "aebf.cgdh.", eDT_8U, "efgh"}};
+    const TempFolder oFolder;
+    for (const auto& [header, data, oType, expected] : FILES)
+    {
+        oFolder.Write("x.hdr", header);
+        const auto poDataset = Open(oFolder.Write("x.bil", data));
+        BasicReader oReader(poDataset.get(), std::vector<unsigned int>{Rasters(*poDataset).GetChanCount()}, false);
+        EXPECT_EQ(oReader.GetDataType(), oType) << header;
+        EXPECT_EQ(krv::test::ReadPixels(oReader), expected) << header;
+    }
+    oFolder.Write("x.hdr", size + "LAYOUT BSQ\nBANDGAPBYTES 8000000000000\n");
+    EXPECT_NE(krv::test::Error([&] { Open(oFolder.File("x.bil")); }), "");
 }
 
 // Random windows of random channels, of every layout and byte order, read and written, beside a naive model.

@@ -8,6 +8,7 @@
 #include "datasources/writer/basicwriter.h"
 #include "operations/source/sourcefile.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/nspio/warning.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/jsontext.h"
 #include "tools/krv/progress.h"
@@ -99,7 +100,7 @@ bool HasPlaceForLevels(IDataset& oDataset)
 }
 
 // A file that cannot hold levels, or cannot be changed, gets them in a file beside it.
-std::unique_ptr<IDataset> OpenForUpdate(const std::string& file)
+std::unique_ptr<IDataset> OpenForUpdate(const std::string& file, krv::datasources::IRasterDataset& oRead)
 {
     auto* const poManager = krv::datasources::DatasetManager::GetInstance();
     std::unique_ptr<IDataset> poDataset;
@@ -120,6 +121,9 @@ std::unique_ptr<IDataset> OpenForUpdate(const std::string& file)
         std::rethrow_exception(poRefusal);
     if (poDataset == nullptr)
         throw krv::DataException(file + ": levels can be made neither in the file nor beside it");
+    const std::unique_ptr<krv::datasources::IOverviewManager> poOwn(oRead.GetOverviewManager());
+    if (poOwn != nullptr && !poOwn->GetLevels().empty())
+        krv::nspio::Warning::Warn(file + ": it holds levels of its own, which are read in place of those beside it");
     return poDataset;
 }
 
@@ -160,7 +164,7 @@ int RunOverviews(const std::string& file, Options& oOptions)
         Print(fmt::format("{}: {} x {} pixels need no overviews\n", file, nWidth, nHeight));
         return 0;
     }
-    const std::unique_ptr<IDataset> poDataset = OpenForUpdate(file);
+    const std::unique_ptr<IDataset> poDataset = OpenForUpdate(file, oFile.GetRaster());
     for (const ChannelGroup& oGroup : oGroups)
     {
         BasicWriter oWriter(dynamic_cast<krv::datasources::IRasterDataset*>(poDataset.get()), oGroup.channels);
