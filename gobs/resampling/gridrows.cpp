@@ -67,18 +67,9 @@ private:
             moScratch.push_back(detail::KernelAt(meMethod, (static_cast<double>(n) + 0.5 - nPlace) / mnStretch));
             nTotal += moScratch.back();
         }
-        // Weights of nothing at the ends count for nothing, not for the range either.
-        std::size_t nBegin = 0, nEnd = moScratch.size();
-        while (nBegin < nEnd && moScratch[nBegin] == 0)
-            ++nBegin;
-        while (nEnd > nBegin && moScratch[nEnd - 1] == 0)
-            --nEnd;
-        oTaps.mnEnd = oTaps.mnFirst + static_cast<long long>(nEnd);
-        oTaps.mnFirst += static_cast<long long>(nBegin);
-        for (std::size_t n = nBegin; n < nEnd; ++n)
-            moWeights.push_back(static_cast<float>(moScratch[n] / nTotal));
-        return nBegin < nEnd &&
-               std::none_of(&moScratch[nBegin], &moScratch[nBegin] + (nEnd - nBegin), [](double n) { return n == 0; });
+        for (const double nWeight : moScratch)
+            moWeights.push_back(static_cast<float>(nWeight / nTotal));
+        return !moScratch.empty();
     }
 
     // The pixels whose centres lie in the box, rounded as the interpolator does it.
@@ -86,8 +77,7 @@ private:
     {
         const auto IsWithin = [&](long long n)
         {
-            const double nPart = mnAside * (static_cast<double>(n) + 0.5 - nPlace) / (mnStep * mnAside);
-            return nPart >= -0.5 && nPart < 0.5;
+            return detail::IsInFootprint(mnAside * (static_cast<double>(n) + 0.5 - nPlace) / (mnStep * mnAside));
         };
         const double nHalf = std::fabs(mnStep) / 2;
         if (nHalf > static_cast<double>(MOST_TAPS) / 2)

@@ -300,7 +300,8 @@ private:
             mnWeight += nWeight;
             for (unsigned int n = 0; n < P; ++n)
             {
-                moSums[n] += nWeight * static_cast<Real>(pValue[n]);
+                if (nWeight != 0)
+                    moSums[n] += nWeight * static_cast<Real>(pValue[n]);
                 moLowest[n] = std::min(moLowest[n], pValue[n]);
                 moHighest[n] = std::max(moHighest[n], pValue[n]);
             }
@@ -329,13 +330,13 @@ private:
                     const std::size_t nPixel = IndexOf(oWindow, oX.mnFirst + static_cast<long long>(x),
                                                        oY.mnFirst + static_cast<long long>(y));
                     const Real nWeight = static_cast<Real>(oX.moWeights[x]) * static_cast<Real>(oY.moWeights[y]);
-                    if (nWeight != 0 && IsValid(oWindow, nPixel, nChannel))
+                    if (IsValid(oWindow, nPixel, nChannel))
                         oSum.Add(reinterpret_cast<const T*>(oWindow.mpPixels) + nPixel * mnSamples + nChannel * P,
                                  nWeight);
                 }
             }
-            // Halves that were not met exactly are halves.
-            constexpr Real ALMOST = 1 - Real(1e-12);
+            // Halves that rounding keeps from being met are halves.
+            constexpr Real ALMOST = 1 - 10 * Real(detail::ROUNDING);
             const bool bValid = oSum.mnWeight > 0 && 2 * oSum.mnWeight >= nTotal * ALMOST;
             pValid[nChannel] = bValid ? 1 : 0;
             bAll = bAll && bValid;
@@ -351,10 +352,6 @@ private:
     {
         const auto& [a, b, c, d] = moRule.moFootprint;
         const double nDeterminant = a * d - b * c;
-        const auto IsWithin = [](double n)
-        {
-            return n >= -0.5 && n < 0.5;
-        };
         const auto Begin = [](double nPlace, double nReach, long long nFirst, std::size_t nSize)
         {
             return std::clamp(static_cast<long long>(std::floor(nPlace - nReach - 1)), nFirst,
@@ -376,8 +373,8 @@ private:
             for (long long x = Begin(nX, moReach[0], oWindow.mnX, oWindow.mnWidth); x < nRight; ++x)
             {
                 const double nAcross = static_cast<double>(x) + 0.5 - nX;
-                if (IsWithin((d * nAcross - c * nDown) / nDeterminant) &&
-                    IsWithin((a * nDown - b * nAcross) / nDeterminant))
+                if (detail::IsInFootprint((d * nAcross - c * nDown) / nDeterminant) &&
+                    detail::IsInFootprint((a * nDown - b * nAcross) / nDeterminant))
                     oPixels.push_back(IndexOf(oWindow, x, y));
             }
         }

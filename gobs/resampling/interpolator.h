@@ -25,7 +25,7 @@ struct InterpolationRule
     double mnYStretch = 1; // along the columns
     // What a step of one pixel of the result along its row is in the image, x and y, and what one along its column is.
     std::array<double, 4> moFootprint = {1, 0, 0, 1};
-    // Cubic and lanczos keep to the range of the pixels that they weigh.
+    // Cubic and lanczos keep to the range of the pixels that they reach, those where the kernel crosses zero too.
     bool mbClamp = true;
 };
 

@@ -28,7 +28,7 @@ struct TransformRequest
     // else NaN for real types and 0 for integers.
     std::vector<double> moBackground = {};
     bool mbExact = false; // never from levels of the source
-    bool mbClamp = true;  // cubic and lanczos keep to the range of the pixels that they weigh
+    bool mbClamp = true;  // cubic and lanczos keep to the range of the pixels that they reach
     // Of the result, for maps that are not affine; the others carry that of the source along.
     std::optional<krv::ogc::cs::GeocodingInfo> moGeocoding = {};
 };

@@ -48,23 +48,38 @@ public:
 private:
     class Parts;
 
+    // Part of a row of tiles, and where its pixels go in each group.
+    struct Piece
+    {
+        std::uint64_t mnFirst;  // pixel of the row
+        std::uint64_t mnPixels; // in a run
+        std::vector<unsigned char*> moTargets;
+        std::vector<std::size_t> moPitches;
+    };
+
     const IRasterWriter& First() const { return *moGroups.front().mpoWriter; }
+    std::uint64_t SumOwnBytes() const;
     std::size_t GetPixelBytes() const override { return mnPixelBytes; }
     void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) override;
     void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) override;
-    bool WriteInPlace(const PixelRect& oBand, const unsigned char* pSource, std::size_t nPitch);
+    bool WriteInPlace(const PixelRect& oBand, const unsigned char* pSource, std::size_t nPitch, bool bStream);
+    void StreamRun(const std::vector<Piece>& oPieces, const unsigned char* pSource, std::uint64_t nPixels,
+                   std::vector<std::uint64_t>& oChanged);
     void WriteBand(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch);
     void TakeChanges(const PixelRect& oRect, const std::vector<std::uint64_t>& oChanged);
 
-    std::vector<WriterGroup> moGroups; // ascending by data type
+    std::vector<WriterGroup> moGroups;   // ascending by data type
+    std::vector<std::size_t> moOwnBytes; // of a pixel in each
     krv::gobs::DataType moType;
     std::size_t mnPixelBytes = 0;
+    std::uint64_t mnStreamed = 0;   // pixels
     unsigned int mnBlockHeight = 1; // of the highest blocks
     bool mbMemory = true;           // all groups lie in memory
     std::shared_ptr<SampleChanges> mpoChanges;
     std::vector<unsigned int> moSplitPositions; // of the splitter's channels, in its order
     std::optional<krv::raster::Splitter> moSplitter;
-    std::optional<krv::raster::Merger> moMerger; // made by the first reading
+    std::optional<krv::raster::Merger> moMerger;        // made by the first reading
+    std::vector<std::vector<unsigned char>> moStreamed; // for each group in memory
 };
 
 } // namespace krv::datasources::detail

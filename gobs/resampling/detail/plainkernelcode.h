@@ -137,6 +137,18 @@ struct Places
         }
     }
 
+    // Places that rounding alone keeps from the middle of a pixel are there.
+    void Snap(std::size_t nCount)
+    {
+        constexpr double ROUNDING = 1e-9;
+        for (std::size_t n = 0; n < nCount; ++n)
+        {
+            const bool bNext = moFractions[n] > 1 - ROUNDING;
+            moPixels[n] += bNext ? 1 : 0;
+            moFractions[n] = bNext || moFractions[n] < ROUNDING ? 0 : moFractions[n];
+        }
+    }
+
     std::int32_t moPixels[BLOCK];
     double moFractions[BLOCK];
 };
@@ -202,6 +214,8 @@ struct Cubic
         CubicWeights oXWeights, oYWeights;
         oX.Find(oJob.mpX + nFrom, oJob.mnLeft, nCount);
         oY.Find(oJob.mpY + nFrom, oJob.mnTop, nCount);
+        oX.Snap(nCount);
+        oY.Snap(nCount);
         oXWeights.Find(oX.moFractions, nCount);
         oYWeights.Find(oY.moFractions, nCount);
         const T* const pPixels = reinterpret_cast<const T*>(oJob.mpPixels);
@@ -222,7 +236,7 @@ struct Cubic
         }
     }
 
-    // Places in the middle of a row or column of pixels: the other rows and columns weigh nothing and do not count.
+    // Places in the middle of a row or column of pixels: its neighbours weigh nothing, the last one is out of reach.
     static Floats AddOnGrid(const T* p, std::size_t nRow, const float* pX, const float* pY, bool bClamp)
     {
         Floats oSum{}, oLow = LoadSamples(p + nRow + N), oHigh = oLow;
@@ -230,10 +244,11 @@ struct Cubic
         {
             for (std::size_t x = 0; x < 4; ++x)
             {
-                if (pX[x] == 0 || pY[y] == 0)
+                if ((x == 3 && pX[2] == 0) || (y == 3 && pY[2] == 0))
                     continue;
                 const Floats oPixel = LoadSamples(p + y * nRow + x * N);
-                oSum += Spread(pX[x] * pY[y]) * oPixel;
+                if (pX[x] != 0 && pY[y] != 0)
+                    oSum += Spread(pX[x] * pY[y]) * oPixel;
                 oLow = SmallerOf(oLow, oPixel);
                 oHigh = LargerOf(oHigh, oPixel);
             }
@@ -323,14 +338,17 @@ inline void AddRows(const RowJob& oJob)
         const std::size_t nSums = oJob.mnSums - nFrom < SAMPLES ? oJob.mnSums - nFrom : SAMPLES;
         const T* p = reinterpret_cast<const T*>(oJob.mpPixels) + nFrom;
         float* const __restrict pSums = oJob.mpSums + nFrom;
-        for (std::size_t n = 0; n < nSums; ++n)
-            pSums[n] = oJob.mpRowWeights[0] * static_cast<float>(p[n]);
-        for (std::size_t nRow = 1; nRow < oJob.mnRows; ++nRow)
+        bool bFirst = true;
+        for (std::size_t nRow = 0; nRow < oJob.mnRows; ++nRow, p += oJob.mnRowSamples)
         {
-            p += oJob.mnRowSamples;
             const float nWeight = oJob.mpRowWeights[nRow];
-            for (std::size_t n = 0; n < nSums; ++n)
+            if (nWeight == 0)
+                continue;
+            for (std::size_t n = 0; bFirst && n < nSums; ++n)
+                pSums[n] = nWeight * static_cast<float>(p[n]);
+            for (std::size_t n = 0; !bFirst && n < nSums; ++n)
                 pSums[n] += nWeight * static_cast<float>(p[n]);
+            bFirst = false;
         }
         if (oJob.mpLowest == nullptr)
             continue;
@@ -357,15 +375,25 @@ inline Floats KeepTo(const Floats& oValue, const Floats& oLow, const Floats& oHi
     return LargerOf(oLow, SmallerOf(oHigh, oValue));
 }
 
+// What a weight of nothing makes of a sum: nothing, of infinite ones too.
+template <typename T>
+inline Floats Weigh(const Floats& oWeight, const Floats& oSum)
+{
+    if constexpr (std::is_same_v<T, float>)
+        return oWeight * (oWeight != Floats{} ? oSum : Floats{});
+    else
+        return oWeight * oSum;
+}
+
 // Four samples of one pixel in the lanes.
-template <std::size_t N>
+template <typename T, std::size_t N>
 inline Floats AddPixel(const RowJob& oJob, const Taps& oTaps, std::size_t nAt, std::size_t nTaps)
 {
     const std::size_t nStep = N != 0 ? N : oJob.mnSamples;
     const float* const pWeights = oJob.mpWeights + oTaps.mnWeights;
-    Floats oSum = Spread(pWeights[0]) * LoadSamples(oJob.mpSums + nAt);
+    Floats oSum = Weigh<T>(Spread(pWeights[0]), LoadSamples(oJob.mpSums + nAt));
     for (std::size_t k = 1; k < nTaps; ++k)
-        oSum += Spread(pWeights[k]) * LoadSamples(oJob.mpSums + nAt + k * nStep);
+        oSum += Weigh<T>(Spread(pWeights[k]), LoadSamples(oJob.mpSums + nAt + k * nStep));
     if (oJob.mpLowest == nullptr)
         return oSum;
     Floats oLow = LoadSamples(oJob.mpLowest + nAt), oHigh = LoadSamples(oJob.mpHighest + nAt);
@@ -378,6 +406,7 @@ inline Floats AddPixel(const RowJob& oJob, const Taps& oTaps, std::size_t nAt, s
 }
 
 // Single samples of four pixels in the lanes.
+template <typename T>
 inline Floats AddFour(const RowJob& oJob, const Taps* pTaps, std::size_t nTaps)
 {
     const auto Gather = [&](const float* p, std::size_t k)
@@ -392,9 +421,9 @@ inline Floats AddFour(const RowJob& oJob, const Taps* pTaps, std::size_t nTaps)
         return Floats{oJob.mpWeights[pTaps[0].mnWeights + k], oJob.mpWeights[pTaps[1].mnWeights + k],
                       oJob.mpWeights[pTaps[2].mnWeights + k], oJob.mpWeights[pTaps[3].mnWeights + k]};
     };
-    Floats oSum = Weights(0) * Gather(oJob.mpSums, 0);
+    Floats oSum = Weigh<T>(Weights(0), Gather(oJob.mpSums, 0));
     for (std::size_t k = 1; k < nTaps; ++k)
-        oSum += Weights(k) * Gather(oJob.mpSums, k);
+        oSum += Weigh<T>(Weights(k), Gather(oJob.mpSums, k));
     if (oJob.mpLowest == nullptr)
         return oSum;
     Floats oLow = Gather(oJob.mpLowest, 0), oHigh = Gather(oJob.mpHighest, 0);
@@ -420,20 +449,20 @@ inline void MakePixelsOf(const RowJob& oJob)
         };
         if (N == 1 && n + 4 <= oJob.mnCount && HasAsMany(1) && HasAsMany(2) && HasAsMany(3))
         {
-            StoreFour(pResult + n, AddFour(oJob, pTaps, nTaps));
+            StoreFour(pResult + n, AddFour<T>(oJob, pTaps, nTaps));
             n += 4;
             continue;
         }
         const std::size_t nSamples = N != 0 ? N : oJob.mnSamples;
         const std::size_t nAt = static_cast<std::size_t>(pTaps->mnFirst - oJob.mnFirst) * nSamples;
         if constexpr (N != 0)
-            StorePixel<T, N>(pResult + n * N, AddPixel<N>(oJob, *pTaps, nAt, nTaps), n + 1 == oJob.mnCount);
+            StorePixel<T, N>(pResult + n * N, AddPixel<T, N>(oJob, *pTaps, nAt, nTaps), n + 1 == oJob.mnCount);
         else
         {
             for (std::size_t c = 0; c < nSamples; c += 4)
             {
                 T aValues[4];
-                StoreFour(aValues, AddPixel<N>(oJob, *pTaps, nAt + c, nTaps));
+                StoreFour(aValues, AddPixel<T, N>(oJob, *pTaps, nAt + c, nTaps));
                 std::memcpy(pResult + n * nSamples + c, aValues, (nSamples - c < 4 ? nSamples - c : 4) * sizeof(T));
             }
         }

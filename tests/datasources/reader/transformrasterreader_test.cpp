@@ -6,6 +6,7 @@
 #include "gobs/mask/mask.h"
 #include "gobs/raster/pixelvalue.h"
 #include "gobs/resampling/gridmap.h"
+#include "gobs/resampling/leveltarget.h"
 #include "tests/datasources/reader/readertest.h"
 #include "tests/support/memoryreader.h"
 
@@ -118,7 +119,8 @@ std::vector<double> ValueAt(const Numbers& oImage, const GeocodingInfo& oMap, Re
             {
                 const double dx = static_cast<double>(x) + 0.5 - u, dy = static_cast<double>(y) + 0.5 - v;
                 const double i = (d * dx - b * dy) / (a * d - b * c), j = (a * dy - c * dx) / (a * d - b * c);
-                if (i < -0.5 || i >= 0.5 || j < -0.5 || j >= 0.5)
+                // The first edge belongs to a footprint, its end to the next one.
+                if (i < -0.5 - 1e-9 || i >= 0.5 - 1e-9 || j < -0.5 - 1e-9 || j >= 0.5 - 1e-9)
                     continue;
                 bAnyPixel = true;
                 if (!oImage.IsValid(x, y, nValue))
@@ -148,6 +150,7 @@ std::vector<double> ValueAt(const Numbers& oImage, const GeocodingInfo& oMap, Re
         return oResult;
     }
     const double sx = std::max(1.0, std::hypot(a, b)), sy = std::max(1.0, std::hypot(c, d));
+    const double nRadius = eMethod == Resampling::eBilinear ? 1 : (eMethod == Resampling::eCubic ? 2 : 3);
     if (sx > 1000) // the image is next to nothing beneath such a kernel
         return oResult;
     double nTotal = 0, nSum = 0;
@@ -156,10 +159,11 @@ std::vector<double> ValueAt(const Numbers& oImage, const GeocodingInfo& oMap, Re
     {
         for (auto x = static_cast<long long>(u - 3 * sx - 2); x <= u + 3 * sx + 2; ++x)
         {
-            const double w = Weight(eMethod, (static_cast<double>(x) + 0.5 - u) / sx) *
-                             Weight(eMethod, (static_cast<double>(y) + 0.5 - v) / sy);
+            const double dx = (static_cast<double>(x) + 0.5 - u) / sx, dy = (static_cast<double>(y) + 0.5 - v) / sy;
+            const double w = Weight(eMethod, dx) * Weight(eMethod, dy);
             nTotal += w;
-            if (w == 0 || !oImage.IsValid(x, y, nValue))
+            // All that the kernel reaches count for the range, also where it crosses zero.
+            if (std::max(std::fabs(dx), std::fabs(dy)) > nRadius - 1e-9 || !oImage.IsValid(x, y, nValue))
                 continue;
             nSum += w;
             for (unsigned int n = 0; n < oImage.parts; ++n)
@@ -170,7 +174,7 @@ std::vector<double> ValueAt(const Numbers& oImage, const GeocodingInfo& oMap, Re
             }
         }
     }
-    if (!(nSum > 0) || 2 * nSum < nTotal - 1e-9)
+    if (!(nSum > 0) || 2 * nSum < nTotal * (1 - 1e-8))
         return oResult;
     for (unsigned int n = 0; n < oImage.parts; ++n)
     {
@@ -212,6 +216,11 @@ const std::map<std::string, GeocodingInfo>& Maps()
                                                               {"shifted", {-2.3, 1, 0, 1.7, 0, 1}},
                                                               {"finer", {1, 0.4, 0, 2, 0, 0.37}},
                                                               {"halves", {0, 0.5, 0, 0, 0, 0.5}},
+                                                              {"thirds", {0, 1 / 3.0, 0, 1e-11, 0, 1 / 3.0}},
+                                                              {"half aside", {0.5, 1, 0, 1 - 1e-10, 0, 1}},
+                                                              {"half aside, turned", {9.5, 0, 1, 2 + 1e-10, 1, 0}},
+                                                              {"twos from edges", {0.5 + 1e-11, 2, 0, -0.5, 0, 2}},
+                                                              {"threes", {0, 3, 0, 0.5 - 1e-11, 0, 3}},
                                                               {"turned", {9, 0.8, -0.5, -3, 0.45, 0.85}},
                                                               {"mirrored", {37, -1, 0, 29, 0, -1}},
                                                               {"quarter turn", {0, 0, 1, 29, -1, 0}},
@@ -378,6 +387,49 @@ TEST_F(TransformRasterReaderTest, WhatIsNotValidTakesNoPart)
                     if (HasFatalFailure())
                         return;
                 }
+            }
+        }
+    }
+}
+
+// An image made coarser by a whole number is the level of that factor; boxes that reach outside are the level's alone.
+TEST_F(TransformRasterReaderTest, ALevelIsTheSameImage)
+{
+    for (const NativeDataTypeCode eType : {eDT_16S, eDT_32R, eDT_64R})
+    {
+        const auto oSource = Source(eType, 2);
+        const RasterPtr oPixels(oSource->ReadRaster(0, 0, WIDTH, HEIGHT));
+        for (const unsigned int nFactor : {2u, 3u})
+        {
+            const unsigned int nWidth = WIDTH / nFactor, nHeight = HEIGHT / nFactor;
+            for (const Resampling eMethod : {Resampling::eBilinear, Resampling::eCubic, Resampling::eLanczos,
+                                             Resampling::eAverage, Resampling::eMode})
+            {
+                SCOPED_TRACE(DataType(eType).Describe() + ", " + std::to_string(nFactor) + ", " +
+                             GetResamplingName(eMethod));
+                const SourceForm oForm{WIDTH, HEIGHT, 2, eType, false};
+                RasterPtr oLevel;
+                const auto Store = [&](RasterPtr oTile)
+                {
+                    oLevel = std::move(oTile);
+                };
+                LevelTarget oTarget({{0, 0, nWidth, nHeight}, nWidth, nHeight, 2, eType, Store}, oForm, nullptr);
+                MakeLevelReducer(oForm, {nFactor, {0, 0, nWidth, nHeight}, &oTarget}, {eMethod})
+                    ->Add({{0, 0, WIDTH, HEIGHT}, oPixels->GetBuffer(), nullptr});
+                ASSERT_NE(oLevel, nullptr);
+                const Numbers oExpected = NumbersOf(*oLevel);
+                TransformRequest oRequest{nWidth, nHeight, eMethod};
+                oRequest.mbExact = true;
+                const double n = nFactor;
+                TransformRasterReader oReader(
+                    oSource.get(), std::make_shared<AffineMap>(GeocodingInfo(0, n, 0, 0, 0, n)), oRequest, false);
+                const RasterPtr oRaster(oReader.ReadRaster(0, 0, nWidth, nHeight));
+                const Numbers oFound = NumbersOf(*oRaster);
+                ASSERT_EQ(oFound.samples.size(), oExpected.samples.size());
+                for (std::size_t i = 0; i < oFound.samples.size(); ++i)
+                    ASSERT_NEAR(oFound.samples[i], oExpected.samples[i],
+                                eType == eDT_16S ? 0 : 2e-6 * std::max(1.0, std::fabs(oExpected.samples[i])))
+                        << i / 2 % nWidth << " " << i / 2 / nWidth;
             }
         }
     }
