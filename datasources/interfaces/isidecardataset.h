@@ -54,6 +54,9 @@ public:
     virtual void WriteCRSBeside(const krv::ogc::cs::ICRS& oCRS) = 0;
     // Where the image lies on the map.
     virtual void WriteGeocodingBeside(const krv::ogc::cs::GeocodingInfo& oInfo) = 0;
+    // Nothing is said of it beside afterwards, but for a ".prj", or a world file, which stay as they are.
+    virtual void RemoveCRSBeside() = 0;
+    virtual void RemoveGeocodingBeside() = 0;
 };
 
 } // namespace krv::datasources

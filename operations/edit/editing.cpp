@@ -346,6 +346,58 @@ bool StoreGeocoding(const SourceFile& oFile, const GeocodingInfo& oInfo)
     return true;
 }
 
+bool IsRemoval(const EditRequest& oRequest, const NewPlace& oPlace)
+{
+    return (oRequest.noData && oRequest.noData->empty()) || (oPlace.crs && *oPlace.crs == nullptr) ||
+           (oPlace.geocoding && oPlace.geocoding->IsIdentity()) ||
+           std::any_of(oRequest.tags.begin(), oRequest.tags.end(), [](const TagEdit& oTag) { return !oTag.value; });
+}
+
+// What was removed and is there all the same: a file may say it by other means than a tag, or another file beside it.
+// oTags and oPlaced: what the record changed about, and the place; afterwards what changed indeed.
+void TellWhatStays(const std::string& file, const EditRequest& oRequest, const NewPlace& oPlace,
+                   const AuxiliaryData& oBefore, std::set<std::string>& oTags, std::set<std::string>& oPlaced)
+{
+    const SourceFile oNow(file);
+    const AuxiliaryData oRecord = oNow.GetMetadata();
+    const auto Tell = [&file](const std::string& what)
+    {
+        krv::nspio::Warning::Warn(fmt::format("{}: {} stays: the file says it by other means than a tag of its own, or "
+                                              "another file beside it says it",
+                                              file, what));
+    };
+    const auto TellTag = [&](const std::string& key, const std::string& what)
+    {
+        std::vector<unsigned int> oChannels = oRequest.channels;
+        if (oChannels.empty())
+            oChannels.push_back(0);
+        for (const unsigned int nChannel : oChannels)
+        {
+            const MetadataMap& oMap = nChannel == 0 ? oRecord.GetFileMetadata() : oRecord.GetChanMetadata(nChannel);
+            if (const auto oFound = oMap.find(key); oFound != oMap.end() && !oFound->second.empty())
+                return Tell(what);
+        }
+    };
+    for (const TagEdit& oTag : oRequest.tags)
+        if (!oTag.value)
+            TellTag(oTag.key, "the tag " + oTag.key);
+    if (oRequest.noData && oRequest.noData->empty())
+        TellTag(NO_DATA, "the no-data value");
+    oTags = ListDifferences(oRecord, oBefore);
+    const auto CheckRemoved = [&](const char* pKind, bool bGone, const char* pWhat)
+    {
+        if (bGone)
+            return;
+        Tell(pWhat);
+        oPlaced.erase(pKind);
+    };
+    if (oPlace.crs && *oPlace.crs == nullptr)
+        CheckRemoved("crs", CrsPointer(oNow.GetDataset().ReadCRS()) == nullptr, "the reference system");
+    const auto* const poGeocoded = dynamic_cast<const IGeocodedDataset*>(&oNow.GetDataset());
+    if (oPlace.geocoding && oPlace.geocoding->IsIdentity())
+        CheckRemoved("geocoding", poGeocoded == nullptr || poGeocoded->GetGeocoding().IsIdentity(), "the geocoding");
+}
+
 } // namespace
 
 EditResult EditFile(const std::string& file, const EditRequest& oRequest)
@@ -369,15 +421,20 @@ EditResult EditFile(const std::string& file, const EditRequest& oRequest)
         oResult.levels = poLevels != nullptr && !poLevels->GetLevels().empty();
     }
     // The record comes first: it may hold control points, which a geocoding takes the place of.
-    std::set<std::string> oKinds = ListDifferences(oRecord.Get(), oFile.GetMetadata());
+    const AuxiliaryData oBefore = oFile.GetMetadata();
+    std::set<std::string> oKinds = ListDifferences(oRecord.Get(), oBefore);
     if (!oKinds.empty())
         oFile.GetDataset().WriteAuxiliaryData(oRecord.Get());
+    std::set<std::string> oPlaced;
     if (oPlace.crs && StoreCrs(oFile, *oPlace.crs))
-        oKinds.insert("crs");
+        oPlaced.insert("crs");
     if (oPlace.geocoding && StoreGeocoding(oFile, *oPlace.geocoding))
-        oKinds.insert("geocoding");
-    oResult.changed.assign(oKinds.begin(), oKinds.end());
+        oPlaced.insert("geocoding");
     oFile.GetDataset().Close();
+    if (IsRemoval(oRequest, oPlace))
+        TellWhatStays(file, oRequest, oPlace, oBefore, oKinds, oPlaced);
+    oKinds.merge(oPlaced);
+    oResult.changed.assign(oKinds.begin(), oKinds.end());
     return oResult;
 }
 

@@ -359,6 +359,22 @@ void GenericDataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
     Get().SetGeocoding(oInfo);
 }
 
+void GenericDataset::RemoveCRS()
+{
+    if (auto* const poBeside = Get().GetBeside())
+        return poBeside->RemoveCRSBeside();
+    Need<IPlaceRemoval>("a reference system that can be removed").RemoveCRS();
+}
+
+void GenericDataset::RemoveGeocoding()
+{
+    auto* const poBeside = Get().GetBeside();
+    if (poBeside == nullptr)
+        return Need<IPlaceRemoval>("a geocoding that can be removed").RemoveGeocoding();
+    poBeside->RemoveGeocodingBeside();
+    Get().SetGeocoding({});
+}
+
 std::vector<unsigned int> GenericDataset::GetBitmapList() const
 {
     const auto* const poBitmaps = Get().Find<IBitmapDataset>();

@@ -4,6 +4,7 @@
 #include "datasources/interfaces/idataset.h"
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ipctdataset.h"
+#include "datasources/interfaces/iplaceremoval.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/isidecardataset.h"
 #include "plugins/gdball/levelsbeside.h"
@@ -80,6 +81,7 @@ private:
 class GenericDataset : public krv::datasources::IDataset,
                        public krv::datasources::IRasterDataset,
                        public krv::datasources::IGeocodedDataset,
+                       public krv::datasources::IPlaceRemoval,
                        public krv::datasources::IBitmapDataset,
                        public krv::datasources::IPCTDataset
 {
@@ -115,6 +117,8 @@ public:
 
     const krv::ogc::cs::GeocodingInfo& GetGeocoding() const override;
     void SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo) override;
+    void RemoveCRS() override;
+    void RemoveGeocoding() override;
 
     std::vector<unsigned int> GetBitmapList() const override;
     krv::datasources::IRasterIO* GetBitmapIO(const std::vector<unsigned int>& oBitmaps) override;

@@ -1,5 +1,6 @@
 #include "plugins/raw/rawdataset.h"
 
+#include "datasources/metadata/droppedtags.h"
 #include "gobs/pct/pct.h"
 #include "plugins/raw/envirecord.h"
 #include "toolkit/exceptions/exceptions.h"
@@ -188,7 +189,10 @@ void RawDataset::WriteAuxiliaryData(const AuxiliaryData& oData)
         return StoreBeside(std::move(oAuxXml));
     }
     HeaderText oHeader = moImage.moHeader;
-    oAuxXml.SetTags(WriteTags(oData, oHeader));
+    // What lay beside and is removed would be new to the header.
+    AuxiliaryData oNew = oData;
+    krv::datasources::DropRemoved(oNew, oAuxXml.GetTags());
+    oAuxXml.SetTags(WriteTags(std::move(oNew), oHeader));
     moImage.moHeader = std::move(oHeader);
     moImage.moTags = ReadTags(moImage.moHeader, GetChanCount());
     StoreHeader();

@@ -9,6 +9,7 @@
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <climits>
 #include <cstdio>
@@ -220,6 +221,78 @@ void Dataset::WriteGeocodingBeside(const krv::ogc::cs::GeocodingInfo& oInfo)
         Refuse("a geocoding without an inverse cannot be written", oPlace);
     AuxXml oAuxXml = GetSidecars().GetAuxXml();
     oAuxXml.SetGeocoding(oInfo);
+    GetSidecars().SetAuxXml(std::move(oAuxXml));
+}
+
+void Dataset::RemoveCRSBeside()
+{
+    CheckLacking(GetNeeds().mbCRS, "the reference system cannot be removed", Place::Current());
+    ForgetCRSBeside();
+}
+
+void Dataset::RemoveGeocodingBeside()
+{
+    CheckLacking(GetNeeds().mbGeocoding, "the geocoding cannot be removed", Place::Current());
+    ForgetGeocodingBeside();
+}
+
+// A tag of the file itself that hides one beside is not removed with it: the record never showed that one.
+void Dataset::ForgetTagsBeside(const krv::datasources::AuxiliaryData& oNew)
+{
+    using krv::datasources::MetadataMap;
+    AuxXml oAuxXml = GetSidecars().GetAuxXml();
+    if (oAuxXml.IsEmpty())
+        return;
+    const krv::datasources::AuxiliaryData oShown = ReadAuxiliaryData();
+    krv::datasources::AuxiliaryData oTags = oAuxXml.GetTags();
+    bool bAny = false;
+    const auto Empty = [&bAny](MetadataMap oBeside, const MetadataMap& oBefore, const MetadataMap& oAfter)
+    {
+        for (auto& [key, value] : oBeside)
+        {
+            const auto oWas = oBefore.find(key), oIs = oAfter.find(key);
+            if (value.empty() || oWas == oBefore.end() || oWas->second != value ||
+                (oIs != oAfter.end() && !oIs->second.empty()))
+                continue;
+            value.clear();
+            bAny = true;
+        }
+        return oBeside;
+    };
+    oTags.SetFileMetadata(Empty(oTags.GetFileMetadata(), oShown.GetFileMetadata(), oNew.GetFileMetadata()));
+    for (unsigned int nChannel = 1; nChannel <= std::min(GetChanCount(), oNew.GetChannelCount()); ++nChannel)
+    {
+        oTags.SetChanMetadata(
+            Empty(oTags.GetChanMetadata(nChannel), oShown.GetChanMetadata(nChannel), oNew.GetChanMetadata(nChannel)),
+            nChannel);
+        const std::string beside = oTags.GetChannelDescription(nChannel);
+        if (beside.empty() || beside != oShown.GetChannelDescription(nChannel) ||
+            !oNew.GetChannelDescription(nChannel).empty())
+            continue;
+        oTags.SetChannelDescription("", nChannel);
+        bAny = true;
+    }
+    if (!bAny)
+        return;
+    oAuxXml.SetTags(oTags);
+    GetSidecars().SetAuxXml(std::move(oAuxXml));
+}
+
+void Dataset::ForgetCRSBeside()
+{
+    AuxXml oAuxXml = GetSidecars().GetAuxXml();
+    if (oAuxXml.GetCRS().empty())
+        return;
+    oAuxXml.SetCRS({});
+    GetSidecars().SetAuxXml(std::move(oAuxXml));
+}
+
+void Dataset::ForgetGeocodingBeside()
+{
+    AuxXml oAuxXml = GetSidecars().GetAuxXml();
+    if (!oAuxXml.GetGeocoding())
+        return;
+    oAuxXml.SetGeocoding(std::nullopt);
     GetSidecars().SetAuxXml(std::move(oAuxXml));
 }
 

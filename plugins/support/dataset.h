@@ -98,6 +98,8 @@ public:
     void WriteTagsBeside(const krv::datasources::AuxiliaryData& oData) override;
     void WriteCRSBeside(const krv::ogc::cs::ICRS& oCRS) override;
     void WriteGeocodingBeside(const krv::ogc::cs::GeocodingInfo& oInfo) override;
+    void RemoveCRSBeside() override;
+    void RemoveGeocodingBeside() override;
 
     // For what stands on the dataset.
     // As it was given to the constructor, or as the writer has it.
@@ -135,6 +137,11 @@ protected:
     // For the format to call before pixels of the image change: what lies beside says nothing of their values any more.
     // The record of a file that has no name yet is that of the pixels to come.
     void ForgetPixelsBeside();
+    // For the format to call before it removes what its own file says: ".aux.xml", which would be asked then, says it
+    // no more either.
+    void ForgetTagsBeside(const krv::datasources::AuxiliaryData& oNew);
+    void ForgetCRSBeside();
+    void ForgetGeocodingBeside();
     // What is asked of the files beside; nothing unless overridden.
     virtual Sidecars::Needs GetNeeds() const { return {}; }
     // Throws the DataException of an operation that the format lacks. what: such as "channels cannot be deleted".

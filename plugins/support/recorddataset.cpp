@@ -51,9 +51,11 @@ void RecordDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oD
     if (oData.GetChannelCount() != GetChanCount())
         Refuse("the metadata are those of " + std::to_string(oData.GetChannelCount()) + " channels, not of " +
                std::to_string(GetChanCount()));
+    const krv::datasources::AuxiliaryData oShown = ReadAuxiliaryData();
+    ForgetTagsBeside(oData);
     RecordText oRecord = moRecord;
     oRecord.moTags = oData;
-    krv::datasources::DropRemoved(oRecord.moTags, moRecord.moTags);
+    krv::datasources::DropRemoved(oRecord.moTags, oShown);
     for (const auto& [nLevel, nPlace] : moRecord.moLevels)
         CopyLevel(moRecord.moTags, oRecord.moTags, nLevel);
     Change(std::move(oRecord));
@@ -90,6 +92,7 @@ void RecordDataset::RemoveCRS()
 {
     CheckWriting("the reference system cannot be removed", Place::Current());
     RecordText oRecord = moRecord;
+    ForgetCRSBeside();
     oRecord.RemoveCRS();
     Change(std::move(oRecord));
 }
@@ -98,6 +101,7 @@ void RecordDataset::RemoveGeocoding()
 {
     CheckWriting("the geocoding cannot be removed", Place::Current());
     RecordText oRecord = moRecord;
+    ForgetGeocodingBeside();
     oRecord.RemoveGeocoding();
     Change(std::move(oRecord));
     moGeocoding = {};

@@ -40,6 +40,7 @@ void TifDataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData
     const krv::datasources::AuxiliaryData& oBook = GetBook(PixelUse::eImage);
     for (const PageLevel& oLevel : GetLevels(PixelUse::eImage))
         CopyLevel(oBook, oRecord, oLevel.mnLevel);
+    ForgetTagsBeside(oData);
     Edit([&] { WriteMetadata(oEditor, oEditor.GetPages().front(), oRecord, oPlace); });
     WatchImage();
 }
@@ -102,6 +103,7 @@ void TifDataset::SetGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo)
 void TifDataset::RemoveCRS()
 {
     FileEditor& oEditor = GetEditor("the reference system cannot be removed", Place::Current());
+    ForgetCRSBeside();
     Edit(
         [&]
         {
@@ -112,6 +114,9 @@ void TifDataset::RemoveCRS()
 
 void TifDataset::RemoveGeocoding()
 {
+    const Place oPlace = Place::Current();
+    CheckWriting("the geocoding cannot be removed", oPlace);
+    ForgetGeocodingBeside();
     SetGeocoding(krv::ogc::cs::GeocodingInfo());
 }
 

@@ -22,6 +22,7 @@ namespace
 
 using krv::conformance::ReadFile;
 using krv::conformance::TempFolder;
+using krv::conformance::WriteFile;
 using krv::test::ExpectFailure;
 using krv::test::RunKrv;
 using nlohmann::json;
@@ -97,6 +98,47 @@ TEST_F(EditCommand, EveryFormatThatIsUpdatedTakesAndLosesAllOfIt)
         EXPECT_EQ(oInfo["channels"][0]["noData"], nullptr) << "was not asked for";
         EXPECT_EQ(RunKrv({"checksum", file}).output, oSums);
     }
+}
+
+// What is removed is gone for whoever opens the file next, wherever it stood.
+TEST_F(EditCommand, WhatLiesBesideIsRemovedToo)
+{
+    ASSERT_EQ(RunKrv({"convert", moScene, moFolder.File("bare.png")}).code, 0);
+    std::filesystem::remove(moFolder.File("bare.png.aux.xml"));
+    for (const char* pName : {"a.tif", "a.krv", "a.img", "a.jp2"})
+    {
+        SCOPED_TRACE(pName);
+        const std::string file = moFolder.File(pName);
+        ASSERT_EQ(RunKrv({"convert", moFolder.File("bare.png"), file}).code, 0);
+        std::filesystem::remove(file + ".aux.xml");
+        WriteFile(file + ".aux.xml",
+                  "<PAMDataset><SRS>EPSG:32633</SRS><GeoTransform>100,2,0,800,0,-2</GeoTransform>"
+                  "<Metadata><MDI key=\"OWNER\"> somebody</MDI><MDI key=\"KEPT\"> leading</MDI></Metadata>"
+                  "<PAMRasterBand band=\"1\"><Description>first</Description><NoDataValue>7</NoDataValue>"
+                  "</PAMRasterBand></PAMDataset>");
+        json oInfo = InfoOf(file);
+        ASSERT_EQ(oInfo["crs"]["epsg"], 32633);
+        ASSERT_EQ(oInfo["geocoding"][0], 100.0);
+        ASSERT_EQ(oInfo["channels"][0]["noData"], "7");
+        ASSERT_EQ(oInfo["channels"][0]["description"], "first");
+        const auto oRun = RunKrv({"edit", file, "--no-data", "none", "--crs", "none", "--geocoding", "none",
+                                  "--remove-tag", "OWNER", "--description", "1=none"});
+        ASSERT_EQ(oRun.code, 0) << oRun.errors;
+        EXPECT_EQ(oRun.errors, "");
+        oInfo = InfoOf(file);
+        for (const char* pGone : {"crs", "geocoding"})
+            EXPECT_EQ(oInfo[pGone], nullptr) << pGone;
+        EXPECT_EQ(oInfo["channels"][0]["noData"], nullptr);
+        EXPECT_EQ(oInfo["channels"][0]["description"], nullptr);
+        EXPECT_FALSE(oInfo["metadata"].contains("OWNER")) << oInfo["metadata"];
+        EXPECT_EQ(oInfo["metadata"]["KEPT"], " leading");
+    }
+    // A world file stays, and is told.
+    WriteFile(moFolder.File("a.tfw"), "2\n0\n0\n-2\n101\n799\n");
+    const auto oRun = RunKrv({"edit", moFolder.File("a.tif"), "--geocoding", "none"});
+    EXPECT_EQ(oRun.code, 0);
+    EXPECT_NE(oRun.errors.find("the geocoding stays"), std::string::npos) << oRun.errors;
+    EXPECT_NE(oRun.output.find("nothing changed"), std::string::npos) << oRun.output;
 }
 
 TEST_F(EditCommand, WhatMakesNoSenseChangesNothing)

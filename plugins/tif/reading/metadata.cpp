@@ -42,12 +42,18 @@ void ReadBaseline(TIFF* poTiff, AuxiliaryData& oData)
 
 void ReadResolution(TIFF* poTiff, AuxiliaryData& oData)
 {
-    float nResolution = 0;
     bool bAny = false;
-    if (TIFFGetField(poTiff, TIFFTAG_XRESOLUTION, &nResolution) == 1)
-        SetText(oData, "XResolution", NumberText(nResolution)), bAny = true;
-    if (TIFFGetField(poTiff, TIFFTAG_YRESOLUTION, &nResolution) == 1)
-        SetText(oData, "YResolution", NumberText(nResolution)), bAny = true;
+    // libtiff keeps one mark for both: it says 0 of the one that is not there, and 0 says nothing.
+    const auto SetResolution = [&](const char* pKey, std::uint32_t nTag)
+    {
+        float nResolution = 0;
+        if (TIFFGetField(poTiff, nTag, &nResolution) != 1 || nResolution == 0)
+            return;
+        SetText(oData, pKey, NumberText(nResolution));
+        bAny = true;
+    };
+    SetResolution("XResolution", TIFFTAG_XRESOLUTION);
+    SetResolution("YResolution", TIFFTAG_YRESOLUTION);
     std::uint16_t nUnit = 0;
     if (bAny && TIFFGetFieldDefaulted(poTiff, TIFFTAG_RESOLUTIONUNIT, &nUnit) == 1 &&
         nUnit < std::size(RESOLUTION_UNITS))

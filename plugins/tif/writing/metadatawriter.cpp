@@ -186,7 +186,7 @@ private:
         if (value.empty())
             return true;
         const std::optional<std::vector<double>> oNumbers = ParseNumbers(value);
-        if (!oNumbers || oNumbers->size() != 1 || !(oNumbers->front() >= 0))
+        if (!oNumbers || oNumbers->size() != 1 || !(oNumbers->front() > 0))
             return false;
         for (const double nBase : {10.0, 2.0})
             for (double nBelow = 1; nBelow <= 1e9; nBelow *= nBase)

@@ -3,6 +3,7 @@
 #include "toolkit/exceptions/exceptions.h"
 #include "toolkit/nspio/warning.h"
 
+#include <cstring>
 #include <memory>
 
 #include <vips/vips.h>
@@ -15,9 +16,15 @@ namespace
 
 thread_local Listener* spoListener = nullptr;
 
+// Of what is no fault of a file: the colours of a picture are taken as they are stored, whatever profile it names.
+bool IsHarmless(const gchar* pText)
+{
+    return std::strstr(pText, "ignoring nclx profile") != nullptr;
+}
+
 void OnLog(const gchar*, GLogLevelFlags, const gchar* pText, gpointer)
 {
-    if (spoListener != nullptr)
+    if (spoListener != nullptr && !IsHarmless(pText))
         spoListener->Take(pText);
 }
 
