@@ -8,10 +8,11 @@
 namespace krv::simd
 {
 
-// Words from and to memory of any alignment.
+// Words and vectors from and to memory of any alignment. Load and Store are never calls: of a vector they are code for
+// the instruction set of the file that uses them, which the linker must not share with another.
 
 template <typename T>
-inline T Load(const unsigned char* source)
+[[gnu::always_inline]] inline T Load(const void* source)
 {
     T nValue;
     std::memcpy(&nValue, source, sizeof(T));
@@ -19,7 +20,7 @@ inline T Load(const unsigned char* source)
 }
 
 template <typename T>
-inline void Store(unsigned char* destination, T nValue)
+[[gnu::always_inline]] inline void Store(void* destination, T nValue)
 {
     std::memcpy(destination, &nValue, sizeof(T));
 }
