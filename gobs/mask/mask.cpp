@@ -3,15 +3,12 @@
 #include "gobs/raster/raster.h"
 #include "toolkit/core/hblock.h"
 #include "toolkit/exceptions/exceptions.h"
+#include "toolkit/simd/vectors.h"
 
 #include <array>
 #include <bit>
 #include <cstring>
 #include <string>
-
-#ifdef __SSSE3__
-#include <immintrin.h>
-#endif
 
 namespace krv::gobs
 {
@@ -37,18 +34,17 @@ unsigned char PackWord(std::uint64_t nWord)
     return static_cast<unsigned char>((nSet * 0x8040201008040201ull) >> 56);
 }
 
-// Packs whole pairs of words, as far as vectors can; returns the number of words done.
+// Packs whole pairs of words, as far as vectors can; returns the number of words done. The first byte's bit is the
+// highest of its eight:
+//     bytes    b0 b1 .. b7 | b8 .. b15      turned   b7 .. b1 b0 | b15 .. b8      their tops, lowest first
 std::uint64_t PackVectors(const unsigned char* pBytes, std::uint64_t nWords, unsigned char* pBits)
 {
     std::uint64_t i = 0;
-#ifdef __SSSE3__
-    const __m128i oTurned = _mm_set_epi8(8, 9, 10, 11, 12, 13, 14, 15, 0, 1, 2, 3, 4, 5, 6, 7);
+#if defined(KRV_VECTORS)
     for (; i + 2 <= nWords; i += 2)
     {
-        const __m128i oBytes = _mm_loadu_si128(reinterpret_cast<const __m128i*>(pBytes + i * 8));
-        const __m128i oClear = _mm_cmpeq_epi8(_mm_shuffle_epi8(oBytes, oTurned), _mm_setzero_si128());
-        const auto nPair = static_cast<std::uint16_t>(~_mm_movemask_epi8(oClear));
-        std::memcpy(pBits + i, &nPair, sizeof nPair);
+        const auto oClear = simd::SwapBytes<std::uint64_t>(simd::Load<simd::Bytes>(pBytes + i * 8)) == simd::Bytes{};
+        simd::Store(pBits + i, static_cast<std::uint16_t>(~simd::TopBits(oClear)));
     }
 #endif
     return i;
@@ -80,19 +76,18 @@ constexpr std::array<EightBytes, 256> MakeExpansion()
 constexpr std::array<EightBytes, 256> EXPANSION = MakeExpansion();
 
 // Expands whole pairs of bytes, as far as vectors can; returns the number of bytes of bits done.
+//     each eight times   b0 b0 b0 b0 b0 b0 b0 b0 | b1 b1 ..
+//     and                80 40 20 10 08 04 02 01 | 80 40 ..      then at most 1
 std::uint64_t ExpandVectors(const unsigned char* pBits, std::uint64_t nBytes, unsigned char* pBytes)
 {
     std::uint64_t i = 0;
-#ifdef __SSSE3__
-    const __m128i oSpread = _mm_set_epi8(1, 1, 1, 1, 1, 1, 1, 1, 0, 0, 0, 0, 0, 0, 0, 0);
-    const __m128i oPlaces = _mm_set1_epi64x(0x0102040810204080ll);
+#if defined(KRV_VECTORS)
+    static constexpr simd::Shuffle EIGHT_TIMES = simd::Shuffle::Make([](std::size_t n) { return n / 8; });
+    const auto oPlaces = simd::As<std::uint8_t>(simd::Spread<simd::Vector<std::uint64_t, 2>>(0x0102040810204080));
     for (; i + 2 <= nBytes; i += 2)
     {
-        std::uint16_t nPair;
-        std::memcpy(&nPair, pBits + i, sizeof nPair);
-        const __m128i oBits = _mm_and_si128(_mm_shuffle_epi8(_mm_cvtsi32_si128(nPair), oSpread), oPlaces);
-        const __m128i oOnes = _mm_min_epu8(oBits, _mm_set1_epi8(1));
-        _mm_storeu_si128(reinterpret_cast<__m128i*>(pBytes + i * 8), oOnes);
+        const simd::Bytes oBits = EIGHT_TIMES(simd::LoadFirst<2>(pBits + i)) & oPlaces;
+        simd::Store(pBytes + i * 8, simd::Smaller(oBits, simd::Spread<simd::Bytes>(1)));
     }
 #endif
     return i;

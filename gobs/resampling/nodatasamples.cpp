@@ -64,7 +64,9 @@ bool HasValue(const std::vector<ChannelRule<T>>& oRules)
 }
 
 // The rules of all channels, laid out as samples lie in rows: after as many vectors as there are channels it begins
-// anew.
+// anew. Of three channels in lanes of 32 bits:
+//     samples   a0 b0 c0 a1 | b1 c1 a2 b2 | c2 a3 b3 c3 | a4 ..
+//     values    A  B  C  A  | B  C  A  B  | C  A  B  C  | A  ..
 template <typename T>
 class Pattern
 {
@@ -86,9 +88,8 @@ public:
             oNaN.push_back(static_cast<BitsOf<T>>(oRule.mbNaN ? ~BitsOf<T>(0) : BitsOf<T>(0)));
         }
         for (std::size_t n = 0; n < moVectors.size(); ++n)
-            moVectors[n] = {detail::LoadVector<Samples>(&oValues[n * LANES]),
-                            detail::LoadVector<Samples>(&oBeside[n * LANES]),
-                            detail::LoadVector<Bits>(&oSet[n * LANES]), detail::LoadVector<Bits>(&oNaN[n * LANES])};
+            moVectors[n] = {simd::Load<Samples>(&oValues[n * LANES]), simd::Load<Samples>(&oBeside[n * LANES]),
+                            simd::Load<Bits>(&oSet[n * LANES]), simd::Load<Bits>(&oNaN[n * LANES])};
     }
 
     // All bits set in the lanes of samples that equal their channel's value, or are NaN where that counts.
@@ -153,9 +154,7 @@ public:
                    [&](std::size_t nAt, std::size_t nCount, std::size_t nVector)
                    {
                        const Bits oFound = MatchAt(pSamples + nAt * sizeof(T), nCount, nVector);
-                       const auto oValid =
-                           (__builtin_convertvector(oFound, typename detail::VectorsOf<T>::Valid) & std::uint8_t(1)) ^
-                           std::uint8_t(1);
+                       const auto oValid = (simd::Convert<std::uint8_t>(oFound) & std::uint8_t(1)) ^ std::uint8_t(1);
                        std::memcpy(pValid + nAt, &oValid, nCount);
                    });
     }
@@ -167,7 +166,7 @@ private:
     Bits MatchAt(const unsigned char* pSamples, std::size_t nCount, std::size_t nVector) const
     {
         if (nCount == Pattern<T>::LANES)
-            return moPattern.Match(detail::LoadVector<Samples>(pSamples), nVector);
+            return moPattern.Match(simd::Load<Samples>(pSamples), nVector);
         Samples oSamples{};
         std::memcpy(&oSamples, pSamples, nCount * sizeof(T));
         Bits oFound = moPattern.Match(oSamples, nVector);
@@ -210,9 +209,9 @@ public:
                            if (pValid != nullptr)
                                std::memcpy(&oValid, pValid + nAt, nCount);
                        }
-                       const Bits oInvalid =
-                           pValid == nullptr ? Bits{}
-                                             : reinterpret_cast<Bits>(__builtin_convertvector(oValid, Bits) == Bits{});
+                       const Bits oInvalid = pValid == nullptr
+                                                 ? Bits{}
+                                                 : reinterpret_cast<Bits>(simd::Convert<BitsOf<T>>(oValid) == Bits{});
                        const Samples oSettled = moPattern.Settle(oSamples, oInvalid, nVector);
                        if (nCount == Pattern<T>::LANES)
                            std::memcpy(pSamples, &oSettled, sizeof oSettled);

@@ -2,7 +2,7 @@
 
 #include "toolkit/raster/detail/shuffleplan.h"
 #include "toolkit/simd/memoryaccess.h"
-#include "toolkit/simd/vector16.h"
+#include "toolkit/simd/vectors.h"
 
 #include <algorithm>
 #include <type_traits>
@@ -122,12 +122,10 @@ void GatherRows(const unsigned char* source, std::size_t nSourcePitch, std::size
     }
 }
 
-#if defined(KRV_VECTOR16)
-using simd::LoadVector;
+#if defined(KRV_VECTORS)
+using simd::Block;
 using simd::MixHigh;
 using simd::MixLow;
-using simd::StoreVector;
-using simd::Vector;
 
 template <std::size_t nBytes>
 using Unsigned =
@@ -141,15 +139,15 @@ using Unsigned =
 template <typename T>
 struct Quads
 {
-    Vector moVectors[4];
+    Block moVectors[4];
 
     explicit Quads(const unsigned char* const* planes, std::size_t nOffset)
     {
         using Pair = Unsigned<2 * sizeof(T)>;
-        const Vector a = LoadVector(planes[0] + nOffset), b = LoadVector(planes[1] + nOffset);
-        const Vector c = LoadVector(planes[2] + nOffset), d = LoadVector(planes[3] + nOffset);
-        const Vector oLowAb = MixLow<T>(a, b), oHighAb = MixHigh<T>(a, b);
-        const Vector oLowCd = MixLow<T>(c, d), oHighCd = MixHigh<T>(c, d);
+        const Block a = Load<Block>(planes[0] + nOffset), b = Load<Block>(planes[1] + nOffset);
+        const Block c = Load<Block>(planes[2] + nOffset), d = Load<Block>(planes[3] + nOffset);
+        const Block oLowAb = MixLow<T>(a, b), oHighAb = MixHigh<T>(a, b);
+        const Block oLowCd = MixLow<T>(c, d), oHighCd = MixHigh<T>(c, d);
         moVectors[0] = MixLow<Pair>(oLowAb, oLowCd);
         moVectors[1] = MixHigh<Pair>(oLowAb, oLowCd);
         moVectors[2] = MixLow<Pair>(oHighAb, oHighCd);
@@ -161,9 +159,9 @@ struct Quads
 template <typename T>
 void MixTwo(const unsigned char* const* planes, std::size_t nOffset, unsigned char* destination, std::size_t)
 {
-    const Vector a = LoadVector(planes[0] + nOffset), b = LoadVector(planes[1] + nOffset);
-    StoreVector(destination, MixLow<T>(a, b));
-    StoreVector(destination + 16, MixHigh<T>(a, b));
+    const Block a = Load<Block>(planes[0] + nOffset), b = Load<Block>(planes[1] + nOffset);
+    Store(destination, MixLow<T>(a, b));
+    Store(destination + 16, MixHigh<T>(a, b));
 }
 
 // What plane nPlane gives to vector nVector of three-channel pixels. Each of the three vectors is put together from one
@@ -182,15 +180,11 @@ inline constexpr simd::Shuffle THIRD = simd::Shuffle::Make(
 template <typename T>
 void MixThree(const unsigned char* const* planes, std::size_t nOffset, unsigned char* destination, std::size_t)
 {
-    const Vector a = LoadVector(planes[0] + nOffset), b = LoadVector(planes[1] + nOffset);
-    const Vector c = LoadVector(planes[2] + nOffset);
-    const auto oMix = [](Vector x, Vector y, Vector z)
-    {
-        return _mm_or_si128(_mm_or_si128(x, y), z);
-    };
-    StoreVector(destination, oMix(THIRD<T, 0, 0>(a), THIRD<T, 0, 1>(b), THIRD<T, 0, 2>(c)));
-    StoreVector(destination + 16, oMix(THIRD<T, 1, 0>(a), THIRD<T, 1, 1>(b), THIRD<T, 1, 2>(c)));
-    StoreVector(destination + 32, oMix(THIRD<T, 2, 0>(a), THIRD<T, 2, 1>(b), THIRD<T, 2, 2>(c)));
+    const Block a = Load<Block>(planes[0] + nOffset), b = Load<Block>(planes[1] + nOffset);
+    const Block c = Load<Block>(planes[2] + nOffset);
+    Store(destination, THIRD<T, 0, 0>(a) | THIRD<T, 0, 1>(b) | THIRD<T, 0, 2>(c));
+    Store(destination + 16, THIRD<T, 1, 0>(a) | THIRD<T, 1, 1>(b) | THIRD<T, 1, 2>(c));
+    Store(destination + 32, THIRD<T, 2, 0>(a) | THIRD<T, 2, 1>(b) | THIRD<T, 2, 2>(c));
 }
 
 template <typename T>
@@ -198,7 +192,7 @@ void MixFour(const unsigned char* const* planes, std::size_t nOffset, unsigned c
 {
     const Quads<T> oQuads(planes, nOffset);
     for (std::size_t i = 0; i < 4; ++i)
-        StoreVector(destination + i * 16, oQuads.moVectors[i]);
+        Store(destination + i * 16, oQuads.moVectors[i]);
 }
 
 template <typename T>
@@ -208,8 +202,8 @@ void MixEight(const unsigned char* const* planes, std::size_t nOffset, unsigned 
     const Quads<T> oFirst(planes, nOffset), oSecond(planes + 4, nOffset);
     for (std::size_t i = 0; i < 4; ++i)
     {
-        StoreVector(destination + i * 32, MixLow<Quad>(oFirst.moVectors[i], oSecond.moVectors[i]));
-        StoreVector(destination + i * 32 + 16, MixHigh<Quad>(oFirst.moVectors[i], oSecond.moVectors[i]));
+        Store(destination + i * 32, MixLow<Quad>(oFirst.moVectors[i], oSecond.moVectors[i]));
+        Store(destination + i * 32 + 16, MixHigh<Quad>(oFirst.moVectors[i], oSecond.moVectors[i]));
     }
 }
 
@@ -221,7 +215,7 @@ void MixFourApart(const unsigned char* const* planes, std::size_t nOffset, unsig
     const Quads<T> oQuads(planes, nOffset);
     alignas(16) unsigned char aQuads[64];
     for (std::size_t i = 0; i < 4; ++i)
-        StoreVector(aQuads + i * 16, oQuads.moVectors[i]);
+        Store(aQuads + i * 16, oQuads.moVectors[i]);
     for (std::size_t i = 0; i < 16 / sizeof(T); ++i)
         std::memcpy(destination + i * nPixelBytes, aQuads + i * 4 * sizeof(T), 4 * sizeof(T));
 }

@@ -8,12 +8,13 @@
 namespace krv::simd
 {
 
-// Words from and to memory of any alignment.
+// Words and vectors from and to memory of any alignment. Load and Store are never calls: of a vector they are code for
+// the instruction set of the file that uses them, which the linker must not share with another.
 
 // Files keep their numbers at any address; a cast of the pointer would be undefined. Compiles to one instruction.
 // T: a type that can be copied by its bytes. sizeof(T) bytes are read; whether they are there is the caller's to check.
 template <typename T>
-inline T Load(const unsigned char* source)
+[[gnu::always_inline]] inline T Load(const void* source)
 {
     T nValue;
     std::memcpy(&nValue, source, sizeof(T));
@@ -22,7 +23,7 @@ inline T Load(const unsigned char* source)
 
 // The counterpart: sizeof(T) bytes are written.
 template <typename T>
-inline void Store(unsigned char* destination, T nValue)
+[[gnu::always_inline]] inline void Store(void* destination, T nValue)
 {
     std::memcpy(destination, &nValue, sizeof(T));
 }

@@ -1,13 +1,11 @@
 #include "datasources/maskbuilder/detail/polygonfill.h"
 
+#include "toolkit/simd/vectors.h"
+
 #include <algorithm>
 #include <array>
 #include <cmath>
 #include <limits>
-
-#ifdef __SSE4_1__
-#include <immintrin.h>
-#endif
 
 namespace krv::datasources::detail
 {
@@ -236,42 +234,45 @@ private:
         alignas(16) std::array<std::int32_t, DENSE_ROWS> masks;
     };
 
-#ifdef __SSE4_1__
+#if defined(KRV_VECTORS)
     // By fours of rows; those beyond the edge are not looked at.
+    //     rows        r0 r1 | r2 r3      as doubles, in two vectors
+    //     crossings   x0 x1 | x2 x3
+    //     bits        b0 b1 b2 b3        of 32 bits, one less where a crossing lies left of the area
     void FindBits(const Edge& oEdge, int nBlockRow, int nFirst, int nLast, Bits& oBits) const
     {
-        const __m128d oX = _mm_set1_pd(oEdge.x), oSlope = _mm_set1_pd(oEdge.slope), oArea = _mm_set1_pd(mnFirst);
-        const __m128d oFrom = _mm_set1_pd(static_cast<double>(std::int64_t{nBlockRow} + nFirst - oEdge.firstRow));
-        __m128d oRows = _mm_add_pd(oFrom, _mm_set_pd(1, 0)), oNextRows = _mm_add_pd(oFrom, _mm_set_pd(3, 2));
-        const auto Columns = [this](__m128d oCrossings)
+        using Doubles = simd::Vector<double, 2>;
+        const auto oX = simd::Spread<Doubles>(oEdge.x), oSlope = simd::Spread<Doubles>(oEdge.slope);
+        const auto oArea = simd::Spread<Doubles>(mnFirst);
+        const auto oFrom =
+            simd::Spread<Doubles>(static_cast<double>(std::int64_t{nBlockRow} + nFirst - oEdge.firstRow));
+        Doubles oRows = oFrom + Doubles{0, 1}, oNextRows = oFrom + Doubles{2, 3};
+        const auto Columns = [this](Doubles oCrossings)
         {
-            const __m128d oHigh = _mm_max_pd(_mm_add_pd(oCrossings, _mm_set1_pd(0.5)), _mm_set1_pd(mnLowest));
-            return _mm_cvttpd_epi32(_mm_min_pd(oHigh, _mm_set1_pd(mnHighest)));
+            return simd::Smaller(simd::Larger(oCrossings + 0.5, simd::Spread<Doubles>(mnLowest)),
+                                 simd::Spread<Doubles>(mnHighest));
         };
         for (auto nRow = static_cast<std::size_t>(nFirst); nRow <= static_cast<std::size_t>(nLast); nRow += 4)
         {
-            const __m128d oCrossings = _mm_add_pd(oX, _mm_mul_pd(oRows, oSlope));
-            const __m128d oNextCrossings = _mm_add_pd(oX, _mm_mul_pd(oNextRows, oSlope));
-            const __m128 oLeft = _mm_shuffle_ps(_mm_castpd_ps(_mm_cmplt_pd(oCrossings, oArea)),
-                                                _mm_castpd_ps(_mm_cmplt_pd(oNextCrossings, oArea)), 0x88);
-            const __m128i oFour = _mm_unpacklo_epi64(Columns(oCrossings), Columns(oNextCrossings));
-            const __m128i oBit = _mm_add_epi32(_mm_sub_epi32(oFour, _mm_set1_epi32(mnFirst)), _mm_castps_si128(oLeft));
-            const __m128i oPlace = _mm_slli_epi32(_mm_srai_epi32(oBit, 6), 4);
-            const __m128i oMask = _mm_slli_epi32(_mm_and_si128(oBit, _mm_set1_epi32(63)), 4);
-            _mm_store_si128(reinterpret_cast<__m128i*>(&oBits.places[nRow]), oPlace);
-            _mm_store_si128(reinterpret_cast<__m128i*>(&oBits.masks[nRow]), oMask);
-            oRows = _mm_add_pd(oRows, _mm_set1_pd(4));
-            oNextRows = _mm_add_pd(oNextRows, _mm_set1_pd(4));
+            const Doubles oCrossings = oX + oRows * oSlope, oNextCrossings = oX + oNextRows * oSlope;
+            const auto oLeft =
+                simd::As<std::int32_t>(simd::EveryOther<float, false>(oCrossings < oArea, oNextCrossings < oArea));
+            const auto oFour = simd::TruncateInts(Columns(oCrossings), Columns(oNextCrossings));
+            const auto oBit = oFour - mnFirst + oLeft;
+            simd::Store(&oBits.places[nRow], (oBit >> 6) << 4);
+            simd::Store(&oBits.masks[nRow], (oBit & 63) << 4);
+            oRows += 4;
+            oNextRows += 4;
         }
     }
 
+    // The bit in the odd plane, and in the one beside it where it was set:
+    //     planes   odd | again      bit   b | 0      odd & b, moved up   0 | odd & b
     static void FlipBit(unsigned char* pPlanes, std::int32_t nMask)
     {
         const auto* const pMasks = reinterpret_cast<const unsigned char*>(BIT_MASKS.data());
-        const __m128i oBit = _mm_load_si128(reinterpret_cast<const __m128i*>(pMasks + nMask));
-        const __m128i oOld = _mm_loadu_si128(reinterpret_cast<const __m128i*>(pPlanes));
-        const __m128i oAgain = _mm_slli_si128(_mm_and_si128(oOld, oBit), 8);
-        _mm_storeu_si128(reinterpret_cast<__m128i*>(pPlanes), _mm_or_si128(_mm_xor_si128(oOld, oBit), oAgain));
+        const auto oBit = simd::Load<simd::Block>(pMasks + nMask), oOld = simd::Load<simd::Block>(pPlanes);
+        simd::Store(pPlanes, (oOld ^ oBit) | simd::MoveUp<8>(oOld & oBit));
     }
 #else
     void FindBits(const Edge& oEdge, int nBlockRow, int nFirst, int nLast, Bits& oBits) const

@@ -5,10 +5,10 @@
 #error "This file is compiled for AVX-512 alone; the caller asks the processor first."
 #endif
 #include "gobs/raster/complex.h"
+#include "toolkit/simd/vectors.h"
 
 #include <cstdint>
 #include <cstring>
-#include <immintrin.h>
 #include <type_traits>
 
 // Words stay in registers only when these short loops are unrolled.
@@ -38,51 +38,23 @@ struct Repeated
             std::memcpy(moBytes + n * BYTES, pPattern, BYTES);
     }
 
-    __m512i Get(std::size_t nVector) const { return _mm512_load_si512(moBytes + 64 * nVector); }
+    // As lanes of T.
+    template <typename T>
+    simd::Full<T> Get(std::size_t nVector) const
+    {
+        return simd::Load<simd::Full<T>>(moBytes + 64 * nVector);
+    }
 };
-
-template <class Sample>
-std::uint64_t EqualBits(__m512i a, __m512i b)
-{
-    if constexpr (std::is_same_v<Sample, float>)
-        return _mm512_cmp_ps_mask(_mm512_castsi512_ps(a), _mm512_castsi512_ps(b), _CMP_EQ_OQ);
-    else if constexpr (std::is_same_v<Sample, double>)
-        return _mm512_cmp_pd_mask(_mm512_castsi512_pd(a), _mm512_castsi512_pd(b), _CMP_EQ_OQ);
-    else if constexpr (sizeof(Sample) == 1)
-        return _mm512_cmpeq_epi8_mask(a, b);
-    else if constexpr (sizeof(Sample) == 2)
-        return _mm512_cmpeq_epi16_mask(a, b);
-    else if constexpr (sizeof(Sample) == 4)
-        return _mm512_cmpeq_epi32_mask(a, b);
-    else
-        return _mm512_cmpeq_epi64_mask(a, b);
-}
-
-// Of the samples whose lanes are all ones in oNaNs.
-template <class Sample>
-std::uint64_t NaNBits(__m512i a, __m512i oNaNs)
-{
-    if constexpr (std::is_same_v<Sample, float>)
-        return _mm512_mask_cmp_ps_mask(_mm512_movepi32_mask(oNaNs), _mm512_castsi512_ps(a), _mm512_castsi512_ps(a),
-                                       _CMP_UNORD_Q);
-    else
-        return _mm512_mask_cmp_pd_mask(_mm512_movepi64_mask(oNaNs), _mm512_castsi512_pd(a), _mm512_castsi512_pd(a),
-                                       _CMP_UNORD_Q);
-}
 
 // A bit for each of 64 / N pixels whose N bytes are all zero.
 template <unsigned int N>
-std::uint64_t ZeroPixels(__m512i oBytes)
+std::uint64_t ZeroPixels(simd::Full<std::uint8_t> oBytes)
 {
-    if constexpr (N == 2)
-        return _mm512_testn_epi16_mask(oBytes, oBytes);
-    else if constexpr (N == 4)
-        return _mm512_testn_epi32_mask(oBytes, oBytes);
-    else
-        return _mm512_testn_epi64_mask(oBytes, oBytes);
+    using Pixel = std::conditional_t<N == 2, std::uint16_t, std::conditional_t<N == 4, std::uint32_t, std::uint64_t>>;
+    return simd::ZeroBits(simd::As<Pixel>(oBytes));
 }
 
-// The same of three words, a bit a sample, that hold 64 pixels of three samples.
+// A bit for each of 64 pixels of three samples whose bits in three words are all zero.
 std::uint64_t ZeroTriples(const std::uint64_t* pWords)
 {
     constexpr std::uint64_t THIRDS = 0x9249249249249249ull;
@@ -91,8 +63,8 @@ std::uint64_t ZeroTriples(const std::uint64_t* pWords)
     KRV_UNROLL
     for (int n = 0; n < 3; ++n)
         nAny[n] = pWords[n] | pWords[n] >> 1 | pWords[n] >> 2 | nNext[n] << 63 | nNext[n] << 62;
-    return ~(_pext_u64(nAny[0], THIRDS) | _pext_u64(nAny[1], THIRDS << 2) << 22 |
-             _pext_u64(nAny[2], THIRDS << 1 & ~(1ull << 63)) << 43);
+    return ~(simd::GatherBits(nAny[0], THIRDS) | simd::GatherBits(nAny[1], THIRDS << 2) << 22 |
+             simd::GatherBits(nAny[2], THIRDS << 1 & ~(1ull << 63)) << 43);
 }
 
 template <class Sample, bool WithNaN, unsigned int N>
@@ -116,20 +88,20 @@ std::size_t MarkFew(const unsigned char* pPixels, std::size_t nPixels, const Mar
             for (std::size_t k = 0; k < SIZE; ++k)
             {
                 const std::size_t nAt = n * SIZE + k;
-                const __m512i oPixels = _mm512_loadu_si512(pPixels + 64 * nAt);
-                std::uint64_t nEqual = EqualBits<Sample>(oPixels, oValues.Get(nAt));
+                const auto oPixels = simd::Load<simd::Full<Sample>>(pPixels + 64 * nAt);
+                std::uint64_t nEqual = simd::EqualBits(oPixels, oValues.template Get<Sample>(nAt));
                 if constexpr (WithNaN)
-                    nEqual |= NaNBits<Sample>(oPixels, oNaNs.Get(nAt));
+                    nEqual |= simd::NaNBits(simd::TopBits(oNaNs.template Get<Sample>(nAt)), oPixels);
                 nWords[n] |= nEqual << (64 / SIZE * k);
             }
             if constexpr (N == 1)
                 nMarked = nWords[0];
             else
             {
-                const __m512i oBytes =
-                    _mm512_and_si512(_mm512_xor_si512(_mm512_movm_epi8(nWords[n]), oExpected.Get(n)), oUsed.Get(n));
+                const auto oBytes = (simd::BytesOfBits(nWords[n]) ^ oExpected.template Get<std::uint8_t>(n)) &
+                                    oUsed.template Get<std::uint8_t>(n);
                 if constexpr (N == 3)
-                    nWords[n] = _mm512_movepi8_mask(oBytes);
+                    nWords[n] = simd::TopBits(oBytes);
                 else
                     nMarked |= ZeroPixels<N>(oBytes) << (64 / N * n);
             }
@@ -138,11 +110,7 @@ std::size_t MarkFew(const unsigned char* pPixels, std::size_t nPixels, const Mar
             nMarked = ZeroTriples(nWords);
         if constexpr (N != 1)
             nMarked ^= nInvert;
-        // The product with this matrix turns the bits of each byte round.
-        const __m128i oTurned =
-            _mm_gf2p8affine_epi64_epi8(_mm_cvtsi64_si128(static_cast<long long>(nMarked)),
-                                       _mm_set1_epi64x(static_cast<long long>(0x8040201008040201ull)), 0);
-        _mm_storel_epi64(reinterpret_cast<__m128i*>(pBits), oTurned);
+        simd::Store(pBits, simd::TurnBits(nMarked));
         pPixels += TAKEN * N * SIZE;
         pBits += TAKEN / 8;
     }

@@ -26,16 +26,15 @@ std::size_t MarkMany(const unsigned char* pPixels, std::size_t nPixels, const Ma
     for (std::size_t nGroup = 0; nGroup < nPixels / 16; ++nGroup)
     {
         for (std::size_t k = 0; k < nChannels; ++k)
-            _mm_storeu_si128(reinterpret_cast<__m128i*>(oBytes.data() + 16 * k),
-                             Compare<SseOps, Sample, WithNaN>(pPixels, 0, k, oPattern));
+            simd::Store(oBytes.data() + 16 * k, Compare<SseOps, Sample, WithNaN>(pPixels, 0, k, oPattern));
         unsigned int nBits = 0;
         for (unsigned int nPixel = 0; nPixel < 16; ++nPixel)
         {
             const unsigned char* pBytes = oBytes.data() + nPixel * nChannels;
-            __m128i oAny = SseOps::And(SseOps::Broadcast(pBytes + nWhole), SseOps::Broadcast(oRest));
+            SseOps::Vector oAny = SseOps::Broadcast(pBytes + nWhole) & SseOps::Broadcast(oRest);
             for (std::size_t n = 0; n < nWhole; n += 16)
-                oAny = SseOps::Or(oAny, SseOps::Broadcast(pBytes + n));
-            nBits = nBits << 1 | static_cast<unsigned int>(_mm_testz_si128(oAny, oAny));
+                oAny |= SseOps::Broadcast(pBytes + n);
+            nBits = nBits << 1 | (simd::IsZero(oAny) ? 1u : 0u);
         }
         nBits ^= oPattern.mbInvert ? ~0u : 0u;
         pBits[2 * nGroup] = static_cast<unsigned char>(nBits >> 8);

@@ -25,35 +25,29 @@ namespace krv::gobs::detail
 template <class Ops, unsigned int W>
 typename Ops::Vector Narrow(const typename Ops::Vector* pMasks)
 {
+    using std::int16_t, std::int32_t;
     if constexpr (W == 1)
         return pMasks[0];
     else if constexpr (W == 2)
-        return Ops::Narrow16(pMasks[0], pMasks[1]);
+        return Ops::template Narrow<int16_t>(pMasks[0], pMasks[1]);
     else if constexpr (W == 4)
-        return Ops::Narrow16(Ops::Narrow32(pMasks[0], pMasks[1]), Ops::Narrow32(pMasks[2], pMasks[3]));
+        return Ops::template Narrow<int16_t>(Ops::template Narrow<int32_t>(pMasks[0], pMasks[1]),
+                                             Ops::template Narrow<int32_t>(pMasks[2], pMasks[3]));
     else
     {
         static_assert(W == 8);
         typename Ops::Vector oHalf[4];
         KRV_UNROLL
         for (unsigned int k = 0; k < 4; ++k)
-            oHalf[k] = Ops::EvenOf32(pMasks[2 * k], pMasks[2 * k + 1]);
+            oHalf[k] = simd::EveryOther<float, false>(pMasks[2 * k], pMasks[2 * k + 1]);
         return Narrow<Ops, 4>(oHalf);
     }
 }
 
-template <class Ops, unsigned int W>
-typename Ops::Vector EqualLanes(typename Ops::Vector oFirst, typename Ops::Vector oSecond)
-{
-    if constexpr (W == 1)
-        return Ops::Equal8(oFirst, oSecond);
-    else if constexpr (W == 2)
-        return Ops::Equal16(oFirst, oSecond);
-    else if constexpr (W == 4)
-        return Ops::Equal32(oFirst, oSecond);
-    else
-        return Ops::Equal64(oFirst, oSecond);
-}
+template <unsigned int W>
+using LaneOfBytes = std::conditional_t<
+    W == 1, std::uint8_t,
+    std::conditional_t<W == 2, std::uint16_t, std::conditional_t<W == 4, std::uint32_t, std::uint64_t>>>;
 
 // Samples of one part.
 template <class Ops, class Sample>
@@ -62,24 +56,14 @@ struct Matcher
     using Vector = typename Ops::Vector;
     static constexpr unsigned int SIZE = sizeof(Sample);
 
-    static Vector Equal(Vector oPixels, Vector oValues)
-    {
-        if constexpr (std::is_same_v<Sample, float>)
-            return Ops::EqualFloat(oPixels, oValues);
-        else if constexpr (std::is_same_v<Sample, double>)
-            return Ops::EqualDouble(oPixels, oValues);
-        else
-            return EqualLanes<Ops, SIZE>(oPixels, oValues);
-    }
+    static Vector Equal(Vector oPixels, Vector oValues) { return Ops::template Equal<Sample>(oPixels, oValues); }
 
     static Vector NaN(Vector oPixels)
     {
-        if constexpr (std::is_same_v<Sample, float>)
-            return Ops::NaNFloat(oPixels);
-        else if constexpr (std::is_same_v<Sample, double>)
-            return Ops::NaNDouble(oPixels);
+        if constexpr (std::is_floating_point_v<Sample>)
+            return Ops::template NaN<Sample>(oPixels);
         else
-            return Ops::Zero();
+            return Vector{};
     }
 
     // 16 samples of each group against 16 values: a byte of all ones for each that matches.
@@ -94,7 +78,7 @@ struct Matcher
             const Vector oPixels = Ops::Load(pPixels + 16 * k, nStride);
             oMasks[k] = Equal(oPixels, Ops::Broadcast(pValues + 16 * k));
             if constexpr (WithNaN)
-                oMasks[k] = Ops::Or(oMasks[k], Ops::And(NaN(oPixels), Ops::Broadcast(pNaNs + 16 * k)));
+                oMasks[k] |= NaN(oPixels) & Ops::Broadcast(pNaNs + 16 * k);
         }
         return Narrow<Ops, SIZE>(oMasks);
     }
@@ -111,10 +95,8 @@ struct Matcher<Ops, Complex<Part>>
     // Two vectors of part masks to one of sample masks.
     static Vector Both(Vector oFirst, Vector oSecond)
     {
-        if constexpr (SIZE == 8)
-            return Ops::And(Ops::EvenOf64(oFirst, oSecond), Ops::OddOf64(oFirst, oSecond));
-        else
-            return Ops::And(Ops::EvenOf32(oFirst, oSecond), Ops::OddOf32(oFirst, oSecond));
+        using Lane = std::conditional_t<SIZE == 8, std::uint64_t, float>;
+        return simd::EveryOther<Lane, false>(oFirst, oSecond) & simd::EveryOther<Lane, true>(oFirst, oSecond);
     }
 
     template <bool WithNaN>
@@ -131,9 +113,8 @@ struct Matcher<Ops, Complex<Part>>
                              Parts::Equal(oSecond, Ops::Broadcast(pValues + 32 * k + 16)));
             if constexpr (WithNaN)
             {
-                const Vector oNaN = Both(Ops::And(Parts::NaN(oFirst), Ops::Broadcast(pNaNs + 32 * k)),
-                                         Ops::And(Parts::NaN(oSecond), Ops::Broadcast(pNaNs + 32 * k + 16)));
-                oMasks[k] = Ops::Or(oMasks[k], oNaN);
+                oMasks[k] |= Both(Parts::NaN(oFirst) & Ops::Broadcast(pNaNs + 32 * k),
+                                  Parts::NaN(oSecond) & Ops::Broadcast(pNaNs + 32 * k + 16));
             }
         }
         return Narrow<Ops, SIZE>(oMasks);
@@ -161,13 +142,13 @@ typename Ops::Vector OrOfThree(const typename Ops::Vector* pBytes)
 {
     static constexpr LanePick PICKS[3][3] = {
         {{0, 0}, {0, 1}, {0, 2}}, {{1, 0}, {1, 1}, {1, 2}}, {{2, 0}, {2, 1}, {2, 2}}};
-    typename Ops::Vector oAny = Ops::Zero();
+    typename Ops::Vector oAny{};
     KRV_UNROLL
     for (unsigned int nLane = 0; nLane < 3; ++nLane)
     {
         KRV_UNROLL
         for (unsigned int nVector = 0; nVector < 3; ++nVector)
-            oAny = Ops::Or(oAny, Ops::Pick(pBytes[nVector], Ops::Broadcast(PICKS[nLane][nVector].mnFrom)));
+            oAny |= simd::PickBytes(pBytes[nVector], Ops::Broadcast(PICKS[nLane][nVector].mnFrom));
     }
     return oAny;
 }
@@ -177,13 +158,13 @@ template <class Ops, unsigned int N>
 typename Ops::Vector AllZero(const typename Ops::Vector* pBytes)
 {
     if constexpr (N == 3)
-        return Ops::Equal8(OrOfThree<Ops>(pBytes), Ops::Zero());
+        return Ops::template Equal<std::uint8_t>(OrOfThree<Ops>(pBytes), typename Ops::Vector{});
     else
     {
         typename Ops::Vector oMasks[N];
         KRV_UNROLL
         for (unsigned int k = 0; k < N; ++k)
-            oMasks[k] = EqualLanes<Ops, N>(pBytes[k], Ops::Zero());
+            oMasks[k] = Ops::template Equal<LaneOfBytes<N>>(pBytes[k], typename Ops::Vector{});
         return Narrow<Ops, N>(oMasks);
     }
 }
@@ -193,7 +174,8 @@ template <class Ops>
 void StoreBits(typename Ops::Vector oMask, bool bInvert, unsigned char* pBits)
 {
     alignas(16) static constexpr signed char REVERSED[16] = {7, 6, 5, 4, 3, 2, 1, 0, 15, 14, 13, 12, 11, 10, 9, 8};
-    const unsigned int nBits = Ops::Bits(Ops::Pick(oMask, Ops::Broadcast(REVERSED))) ^ (bInvert ? ~0u : 0u);
+    const unsigned int nBits =
+        simd::TopBits(simd::As<std::uint8_t>(simd::PickBytes(oMask, Ops::Broadcast(REVERSED)))) ^ (bInvert ? ~0u : 0u);
     std::memcpy(pBits, &nBits, 2 * Ops::GROUPS);
 }
 
@@ -205,8 +187,8 @@ typename Ops::Vector Compare(const unsigned char* pPixels, std::size_t nStride, 
     const std::size_t nAt = nVector * 16 * sizeof(Sample);
     const auto oMatch = Matcher<Ops, Sample>::template Match<WithNaN>(pPixels + nAt, nStride, oPattern.mpValues + nAt,
                                                                       oPattern.mpNaNs + (WithNaN ? nAt : 0));
-    return Ops::Xor(Ops::And(oMatch, Ops::Broadcast(oPattern.mpUsed + 16 * nVector)),
-                    Ops::Broadcast(oPattern.mpExpected + 16 * nVector));
+    return (oMatch & Ops::Broadcast(oPattern.mpUsed + 16 * nVector)) ^
+           Ops::Broadcast(oPattern.mpExpected + 16 * nVector);
 }
 
 template <class Ops, class Sample, bool WithNaN, unsigned int N>

@@ -3,8 +3,7 @@
 #error "This file is compiled for AVX-512 with byte shuffles alone; the caller asks the processor first."
 #endif
 #include "gobs/pct/detail/colourkernels.h"
-
-#include <immintrin.h>
+#include "toolkit/simd/vectors.h"
 
 #include <cstring>
 
@@ -13,6 +12,8 @@ namespace krv::gobs::detail
 
 namespace
 {
+
+using Bytes = simd::Full<std::uint8_t>;
 
 // The 256 values of one part of the colours, in four registers, found for 64 indices at once. An instruction picks from
 // two of them by the lower seven bits of an index; the eighth bit chooses between two such results.
@@ -27,17 +28,17 @@ struct PartList
         for (std::size_t n = 0; n < 256; ++n)
             aBytes[n] = reinterpret_cast<const std::uint8_t*>(pList + n)[nPart];
         for (std::size_t n = 0; n < 4; ++n)
-            moQuarters[n] = _mm512_load_si512(aBytes + 64 * n);
+            moQuarters[n] = simd::Load<Bytes>(aBytes + 64 * n);
     }
 
-    __m512i Find(__m512i oValues) const
+    Bytes Find(Bytes oValues) const
     {
-        const __m512i oLow = _mm512_permutex2var_epi8(moQuarters[0], oValues, moQuarters[1]);
-        const __m512i oHigh = _mm512_permutex2var_epi8(moQuarters[2], oValues, moQuarters[3]);
-        return _mm512_mask_blend_epi8(_mm512_movepi8_mask(oValues), oLow, oHigh);
+        const Bytes oLow = simd::PickOfTwo(moQuarters[0], oValues, moQuarters[1]);
+        const Bytes oHigh = simd::PickOfTwo(moQuarters[2], oValues, moQuarters[3]);
+        return simd::SelectByBits(simd::TopBits(oValues), oHigh, oLow);
     }
 
-    __m512i moQuarters[4];
+    Bytes moQuarters[4];
 };
 
 // Where the bytes of a vector of interleaved parts come from, two parts at a time: of the first and the second, and
@@ -52,22 +53,22 @@ struct Interleaving
         {
             const unsigned int nByte = 64 * nVector + n, nPart = nByte % PARTS;
             aIndices[n] = static_cast<std::uint8_t>(nByte / PARTS + (nPart % 2 == 1 ? 64 : 0));
-            moIsLater |= __mmask64{nPart >= 2} << n;
+            moIsLater |= std::uint64_t{nPart >= 2} << n;
         }
-        moIndices = _mm512_load_si512(aIndices);
+        moIndices = simd::Load<Bytes>(aIndices);
     }
 
-    __m512i Take(const __m512i* pParts) const
+    Bytes Take(const Bytes* pParts) const
     {
-        const __m512i oFirst = _mm512_permutex2var_epi8(pParts[0], moIndices, pParts[1]);
+        const Bytes oFirst = simd::PickOfTwo(pParts[0], moIndices, pParts[1]);
         if constexpr (PARTS == 3)
-            return _mm512_mask_permutexvar_epi8(oFirst, moIsLater, moIndices, pParts[2]);
-        const __m512i oLater = _mm512_permutex2var_epi8(pParts[2], moIndices, pParts[PARTS - 1]);
-        return _mm512_mask_blend_epi8(moIsLater, oFirst, oLater);
+            return simd::PickInto(oFirst, moIsLater, moIndices, pParts[2]);
+        const Bytes oLater = simd::PickOfTwo(pParts[2], moIndices, pParts[PARTS - 1]);
+        return simd::SelectByBits(moIsLater, oLater, oFirst);
     }
 
-    __m512i moIndices;
-    __mmask64 moIsLater = 0;
+    Bytes moIndices;
+    std::uint64_t moIsLater = 0;
 };
 
 template <unsigned int PARTS>
@@ -78,12 +79,12 @@ void Run(const Colour* pList, const unsigned char* pValues, std::size_t nValues,
                                             Interleaving<PARTS>(3)};
     const auto Make = [&](const unsigned char* pFrom, unsigned char* pTo)
     {
-        const __m512i oValues = _mm512_loadu_si512(pFrom);
-        __m512i aParts[PARTS];
+        const Bytes oValues = simd::Load<Bytes>(pFrom);
+        Bytes aParts[PARTS];
         for (unsigned int n = 0; n < PARTS; ++n)
             aParts[n] = aLists[n].Find(oValues);
         for (unsigned int n = 0; n < PARTS; ++n)
-            _mm512_storeu_si512(pTo + 64 * n, aVectors[n].Take(aParts));
+            simd::Store(pTo + 64 * n, aVectors[n].Take(aParts));
     };
     std::size_t n = 0;
     for (; n + 64 <= nValues; n += 64)

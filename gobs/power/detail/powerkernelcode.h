@@ -5,13 +5,10 @@
 // into vectors; where pixels are complex and it takes pairs apart, they are vectors from the beginning.
 
 #include "gobs/power/detail/powerkernels.h"
+#include "toolkit/simd/vectors.h"
 
 #include <cstdint>
 #include <type_traits>
-
-#if defined(__AVX512DQ__)
-#include <immintrin.h>
-#endif
 
 namespace krv::gobs::detail
 {
@@ -30,24 +27,21 @@ inline std::size_t SquareVectors(const T*, std::size_t, PowerOf<T>*)
     return 0;
 }
 
-#if defined(__AVX512DQ__)
+#if defined(__AVX512VBMI__)
 
-// Sums of eight pixels of which two vectors hold two terms each:
-//     first, second    a0 A0 a1 A1 ..   b0 B0 b1 B1 ..      a0+A0 b0+B0 a1+A1 b1+B1 ..
-constexpr long long IN_ORDER[8] = {0, 2, 4, 6, 1, 3, 5, 7};
-
-inline __m512i AddNeighbours(__m512i oFirst, __m512i oSecond)
+// Lanes as they were before neighbours of two vectors were brought together:
+//     first, second   a0 A0 a1 A1 ..   b0 B0 b1 B1 ..      low + high   a0+A0 b0+B0 a1+A1 b1+B1 ..      a0+A0 a1+A1 ..
+template <typename V>
+inline V InOrder(V o)
 {
-    const __m512i oSums =
-        _mm512_add_epi64(_mm512_unpacklo_epi64(oFirst, oSecond), _mm512_unpackhi_epi64(oFirst, oSecond));
-    return _mm512_permutexvar_epi64(_mm512_loadu_si512(IN_ORDER), oSums);
+    return simd::Picked<0, 2, 4, 6, 1, 3, 5, 7>(o);
 }
 
 // re * re + im * im of 16 values, at most 2^31.
-inline __m512i SquarePairs(const std::int16_t* p)
+inline auto SquarePairs(const std::int16_t* p)
 {
-    const __m512i oPairs = _mm512_loadu_si512(p);
-    return _mm512_madd_epi16(oPairs, oPairs);
+    const auto oPairs = simd::Load<simd::Full<std::int16_t>>(p);
+    return simd::As<std::uint32_t>(simd::AddProducts(oPairs, oPairs));
 }
 
 template <>
@@ -55,14 +49,15 @@ inline std::size_t SquareVectors<2, std::int16_t>(const std::int16_t* p, std::si
 {
     std::size_t n = 0;
     for (; n + 16 <= nPixels; n += 16)
-        _mm512_storeu_ps(pPower + n, _mm512_cvtepu32_ps(SquarePairs(p + 2 * n)));
+        simd::Store(pPower + n, simd::Convert<float>(SquarePairs(p + 2 * n)));
     return n;
 }
 
 // Two neighbours as one of 64 bits.
-inline __m512i AddHalves(__m512i o)
+inline auto AddHalves(simd::Full<std::uint32_t> o)
 {
-    return _mm512_add_epi64(_mm512_and_si512(o, _mm512_set1_epi64(0xFFFFFFFF)), _mm512_srli_epi64(o, 32));
+    const auto oPairs = simd::As<std::int64_t>(o);
+    return (oPairs & 0xFFFFFFFF) + simd::As<std::int64_t>(simd::As<std::uint64_t>(o) >> 32);
 }
 
 template <>
@@ -70,8 +65,11 @@ inline std::size_t SquareVectors<8, std::int16_t>(const std::int16_t* p, std::si
 {
     std::size_t n = 0;
     for (; n + 8 <= nPixels; n += 8)
-        _mm256_storeu_ps(pPower + n, _mm512_cvtepi64_ps(AddNeighbours(AddHalves(SquarePairs(p + 8 * n)),
-                                                                      AddHalves(SquarePairs(p + 8 * n + 32)))));
+    {
+        const auto oFirst = AddHalves(SquarePairs(p + 8 * n)), oSecond = AddHalves(SquarePairs(p + 8 * n + 32));
+        const auto oSums = simd::MixLow<std::int64_t>(oFirst, oSecond) + simd::MixHigh<std::int64_t>(oFirst, oSecond);
+        simd::Store(pPower + n, simd::Convert<float>(InOrder(oSums)));
+    }
     return n;
 }
 
@@ -79,15 +77,14 @@ inline std::size_t SquareVectors<8, std::int16_t>(const std::int16_t* p, std::si
 template <>
 inline std::size_t SquareVectors<2, float>(const float* p, std::size_t nPixels, float* pPower)
 {
-    const __m256i oInOrder = _mm512_cvtepi64_epi32(_mm512_loadu_si512(IN_ORDER));
     std::size_t n = 0;
     for (; n + 8 <= nPixels; n += 8)
     {
-        const __m512d oFirst = _mm512_cvtps_pd(_mm256_loadu_ps(p + 2 * n));
-        const __m512d oSecond = _mm512_cvtps_pd(_mm256_loadu_ps(p + 2 * n + 8));
-        const __m512d oReal = _mm512_unpacklo_pd(oFirst, oSecond), oImaginary = _mm512_unpackhi_pd(oFirst, oSecond);
-        const __m512d oPower = _mm512_fmadd_pd(oReal, oReal, _mm512_mul_pd(oImaginary, oImaginary));
-        _mm256_storeu_ps(pPower + n, _mm256_permutevar8x32_ps(_mm512_cvtpd_ps(oPower), oInOrder));
+        const auto oFirst = simd::LoadWidened<double, 8>(p + 2 * n);
+        const auto oSecond = simd::LoadWidened<double, 8>(p + 2 * n + 8);
+        const auto oReal = simd::MixLow<double>(oFirst, oSecond), oImaginary = simd::MixHigh<double>(oFirst, oSecond);
+        const auto oPower = simd::MultiplyAdd(oReal, oReal, oImaginary * oImaginary);
+        simd::Store(pPower + n, InOrder(simd::Convert<float>(oPower)));
     }
     return n;
 }

@@ -355,10 +355,9 @@ private:
         std::size_t n = 0;
         for (; n + Vectors::LANES <= nCount; n += Vectors::LANES)
         {
-            const auto oValid =
-                __builtin_convertvector(LoadVector<typename Vectors::Valid>(oRow.mpCounts + n), typename Vectors::Bits);
+            const auto oValid = simd::Convert<BitsOf<T>>(simd::Load<typename Vectors::Valid>(oRow.mpCounts + n));
             const auto oKept =
-                LoadVector<typename Vectors::Bits>(oRow.mpSums + n * sizeof(T)) & (typename Vectors::Bits{} - oValid);
+                simd::Load<typename Vectors::Bits>(oRow.mpSums + n * sizeof(T)) & (typename Vectors::Bits{} - oValid);
             std::memcpy(pTo + n * sizeof(T), &oKept, sizeof oKept);
         }
         for (; n < nCount; ++n)

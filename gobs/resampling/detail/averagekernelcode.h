@@ -2,18 +2,15 @@
 
 // The inner loops of averages. One source file for each instruction set includes this and is compiled with options of
 // its own, so everything here is local to the file and calls nothing that is not: a function that the linker shares
-// could be the other file's. Vectors are those of the compiler; intrinsics stand where it does not find the way.
+// could be the other file's.
 
 #include "gobs/resampling/detail/averagekernels.h"
+#include "toolkit/simd/vectors.h"
 
 #include <cstdint>
 #include <cstring>
 #include <type_traits>
 #include <utility>
-
-#ifdef __SSE4_1__
-#include <immintrin.h>
-#endif
 
 namespace krv::gobs::detail
 {
@@ -21,87 +18,24 @@ namespace krv::gobs::detail
 namespace
 {
 
-#if defined(__AVX512VBMI__)
-constexpr std::size_t VECTOR_BYTES = 64;
-#elif defined(__AVX2__)
-constexpr std::size_t VECTOR_BYTES = 32;
-#else
-constexpr std::size_t VECTOR_BYTES = 16;
-#endif
 // Bytes. Rows of 1536 bytes in memory, AVX2: 6.5 GB/s without fetching, 18.5 at 1024 bytes ahead, 23 at 4096, 25 at
 // 8192, 24 at 16384, 22 at 32768.
 constexpr std::size_t FETCHED_AHEAD = 8192;
 constexpr std::size_t FETCHED_LINE = 64;
 
-template <typename T, std::size_t LANES>
-struct VectorOf
-{
-    typedef T Type __attribute__((vector_size(LANES * sizeof(T)))); // NOLINT: an attribute of the typedef
-};
-template <typename T, std::size_t LANES>
-using Vector = typename VectorOf<T, LANES>::Type;
-
-template <typename V, typename T>
-inline V LoadAs(const T* p)
-{
-    V o;
-    std::memcpy(&o, p, sizeof o);
-    return o;
-}
-
-template <typename Sum, std::size_t LANES, typename In>
-inline Vector<Sum, LANES> Load(const In* p)
-{
-    [[maybe_unused]] constexpr std::size_t BYTES = LANES * sizeof(Sum);
-    [[maybe_unused]] constexpr bool WORDS = std::is_same_v<In, std::uint8_t> && sizeof(Sum) == 2;
-    [[maybe_unused]] constexpr bool DOUBLE_WORDS = std::is_same_v<In, std::uint16_t> && sizeof(Sum) == 4;
-    [[maybe_unused]] constexpr bool REALS = std::is_same_v<In, float>;
-    using Result = Vector<Sum, LANES>;
-    if constexpr (std::is_same_v<In, Sum>)
-        return LoadAs<Result>(p);
-#if defined(__AVX512VBMI__)
-    else if constexpr (BYTES == 64 && WORDS)
-        return reinterpret_cast<Result>(_mm512_maskz_cvtepu8_epi16(~__mmask32{0}, LoadAs<__m256i>(p)));
-    else if constexpr (BYTES == 64 && DOUBLE_WORDS)
-        return reinterpret_cast<Result>(_mm512_maskz_cvtepu16_epi32(0xFFFF, LoadAs<__m256i>(p)));
-    else if constexpr (BYTES == 64 && REALS)
-        return _mm512_maskz_cvtps_pd(0xFF, LoadAs<__m256>(p));
-#endif
-#if defined(__AVX2__)
-    else if constexpr (BYTES == 32 && WORDS)
-        return reinterpret_cast<Result>(_mm256_cvtepu8_epi16(LoadAs<__m128i>(p)));
-    else if constexpr (BYTES == 32 && DOUBLE_WORDS)
-        return reinterpret_cast<Result>(_mm256_cvtepu16_epi32(LoadAs<__m128i>(p)));
-    else if constexpr (BYTES == 32 && REALS)
-        return _mm256_cvtps_pd(LoadAs<__m128>(p));
-#endif
-#if defined(__SSE4_1__)
-    else if constexpr (BYTES == 16 && WORDS)
-        return reinterpret_cast<Result>(_mm_cvtepu8_epi16(_mm_loadl_epi64(reinterpret_cast<const __m128i*>(p))));
-    else if constexpr (BYTES == 16 && DOUBLE_WORDS)
-        return reinterpret_cast<Result>(_mm_cvtepu16_epi32(_mm_loadl_epi64(reinterpret_cast<const __m128i*>(p))));
-#endif
-    else
-        return __builtin_convertvector(LoadAs<Vector<In, LANES>>(p), Result);
-}
-
-template <std::size_t FIRST, typename T, typename V, std::size_t... I>
-inline void StoreFrom(T* p, V oValues, std::index_sequence<I...>)
-{
-    const auto oPart = __builtin_shufflevector(oValues, oValues, (FIRST + I)...);
-    std::memcpy(p + FIRST, &oPart, sizeof oPart);
-}
+using simd::Vector;
 
 // All lanes, or the first three quarters.
 template <std::size_t COUNT, std::size_t LANES, typename T>
 inline void Store(T* p, Vector<T, LANES> oValues)
 {
     if constexpr (COUNT == LANES)
-        std::memcpy(p, &oValues, sizeof oValues);
+        simd::Store(p, oValues);
     else
     {
-        StoreFrom<0>(p, oValues, std::make_index_sequence<LANES / 2>());
-        StoreFrom<LANES / 2>(p, oValues, std::make_index_sequence<LANES / 4>());
+        constexpr std::size_t HALF = sizeof oValues / 2;
+        simd::Store(p, simd::Part<0, HALF>(oValues));
+        simd::Store(p + LANES / 2, simd::Part<HALF, HALF / 2>(oValues));
     }
 }
 
@@ -112,41 +46,39 @@ inline void Store(T* p, Vector<T, LANES> oValues)
 //     words              r0+r1 g0+g1 b0+b1 r2+r3 g2+g3 b2+b3  0     0        plus those of the second row
 template <unsigned int N, std::size_t LANES>
 constexpr bool HAS_BYTE_SUMS = false;
-#if defined(__SSE4_1__)
+#if defined(KRV_VECTORS)
 template <unsigned int N>
 constexpr bool HAS_BYTE_SUMS<N, 8> = true;
 
-template <unsigned int N, char FIRST = 0>
-inline __m128i BesideEachOther()
+template <unsigned int N, std::uint8_t K = 0>
+inline simd::Bytes BesideEachOther()
 {
-    constexpr char K = FIRST;
     if constexpr (N == 2)
-        return _mm_setr_epi8(0, 2, 1, 3, 4, 6, 5, 7, 8, 10, 9, 11, 12, 14, 13, 15);
+        return simd::Bytes{0, 2, 1, 3, 4, 6, 5, 7, 8, 10, 9, 11, 12, 14, 13, 15};
     else if constexpr (N == 3)
-        return _mm_setr_epi8(K, K + 3, K + 1, K + 4, K + 2, K + 5, K + 6, K + 9, K + 7, K + 10, K + 8, K + 11, -1, -1,
-                             -1, -1);
+        return simd::Bytes{K,     K + 3,  K + 1, K + 4,  K + 2, K + 5, K + 6, K + 9,
+                           K + 7, K + 10, K + 8, K + 11, 0xFF,  0xFF,  0xFF,  0xFF};
     else
-        return _mm_setr_epi8(0, 4, 1, 5, 2, 6, 3, 7, 8, 12, 9, 13, 10, 14, 11, 15);
+        return simd::Bytes{0, 4, 1, 5, 2, 6, 3, 7, 8, 12, 9, 13, 10, 14, 11, 15};
 }
 
 template <unsigned int N>
-inline __m128i AddNeighbours(const std::uint8_t* p, std::integral_constant<std::size_t, 8>)
+inline auto AddNeighbours(const std::uint8_t* p, std::integral_constant<std::size_t, 8>)
 {
-    __m128i oBytes;
+    simd::Bytes oBytes;
     if constexpr (N == 3)
-        oBytes = _mm_insert_epi32(_mm_loadl_epi64(reinterpret_cast<const __m128i*>(p)), LoadAs<int>(p + 8), 2);
+        oBytes = simd::LoadFirst<12>(p);
     else
-        oBytes = LoadAs<__m128i>(p);
+        oBytes = simd::Load<simd::Bytes>(p);
     if constexpr (N != 1)
-        oBytes = _mm_shuffle_epi8(oBytes, BesideEachOther<N>());
-    return _mm_maddubs_epi16(oBytes, _mm_set1_epi8(1));
+        oBytes = simd::PickBytes(oBytes, BesideEachOther<N>());
+    return simd::AddNeighbours(oBytes);
 }
 
 template <unsigned int N>
 inline auto SumBytes(const std::uint8_t* pFirst, const std::uint8_t* pSecond, std::integral_constant<std::size_t, 8> n)
 {
-    return reinterpret_cast<Vector<std::uint16_t, 8>>(
-        _mm_add_epi16(AddNeighbours<N>(pFirst, n), AddNeighbours<N>(pSecond, n)));
+    return AddNeighbours<N>(pFirst, n) + AddNeighbours<N>(pSecond, n);
 }
 #endif
 #if defined(__AVX2__)
@@ -154,26 +86,27 @@ template <unsigned int N>
 constexpr bool HAS_BYTE_SUMS<N, 16> = true;
 
 template <unsigned int N>
-inline __m256i AddNeighbours(const std::uint8_t* p, std::integral_constant<std::size_t, 16>)
+inline auto AddNeighbours(const std::uint8_t* p, std::integral_constant<std::size_t, 16>)
 {
-    __m256i oBytes;
+    Vector<std::uint8_t, 32> oBytes;
     if constexpr (N == 3)
-        oBytes = _mm256_shuffle_epi8(_mm256_set_m128i(LoadAs<__m128i>(p + 8), LoadAs<__m128i>(p)),
-                                     _mm256_set_m128i(BesideEachOther<3, 4>(), BesideEachOther<3>()));
+        oBytes = simd::PickBytes(simd::Join(simd::Load<simd::Bytes>(p), simd::Load<simd::Bytes>(p + 8)),
+                                 simd::Join(BesideEachOther<3>(), BesideEachOther<3, 4>()));
     else
-        oBytes = LoadAs<__m256i>(p);
+        oBytes = simd::Load<Vector<std::uint8_t, 32>>(p);
     if constexpr (N == 2 || N == 4)
-        oBytes = _mm256_shuffle_epi8(oBytes, _mm256_broadcastsi128_si256(BesideEachOther<N>()));
-    return _mm256_maddubs_epi16(oBytes, _mm256_set1_epi8(1));
+        oBytes = simd::PickBytes(oBytes, simd::SpreadGroup<Vector<std::uint8_t, 32>>(BesideEachOther<N>()));
+    return simd::AddNeighbours(oBytes);
 }
 
 template <unsigned int N>
 inline auto SumBytes(const std::uint8_t* pFirst, const std::uint8_t* pSecond, std::integral_constant<std::size_t, 16> n)
 {
-    __m256i oSums = _mm256_add_epi16(AddNeighbours<N>(pFirst, n), AddNeighbours<N>(pSecond, n));
+    const auto oSums = AddNeighbours<N>(pFirst, n) + AddNeighbours<N>(pSecond, n);
     if constexpr (N == 3)
-        oSums = _mm256_permutevar8x32_epi32(oSums, _mm256_setr_epi32(0, 1, 2, 4, 5, 6, 3, 7));
-    return reinterpret_cast<Vector<std::uint16_t, 16>>(oSums);
+        return simd::As<std::uint16_t>(simd::Picked<0, 1, 2, 4, 5, 6, 3, 7>(simd::As<std::uint32_t>(oSums)));
+    else
+        return oSums;
 }
 #endif
 
@@ -181,7 +114,8 @@ template <typename In, typename Sum, typename Mean, unsigned int N>
 struct Reduction
 {
     static constexpr bool FIRST = std::is_same_v<In, Mean>;
-    static constexpr std::size_t MOST_LANES = VECTOR_BYTES / sizeof(Sum) < 4 ? 4 : VECTOR_BYTES / sizeof(Sum);
+    static constexpr std::size_t MOST_LANES =
+        simd::VECTOR_BYTES / sizeof(Sum) < 4 ? 4 : simd::VECTOR_BYTES / sizeof(Sum);
 
     // Of types without such an instruction both rows are added first, then left and right samples are picked out of
     // the two vectors (here of two samples a pixel):
@@ -206,8 +140,7 @@ struct Reduction
         template <std::size_t... I>
         static auto AddPairs(const Vector<Sum, LANES>& oLow, const Vector<Sum, LANES>& oHigh, std::index_sequence<I...>)
         {
-            return __builtin_shufflevector(oLow, oHigh, Find(I, false)...) +
-                   __builtin_shufflevector(oLow, oHigh, Find(I, true)...);
+            return simd::Picked<Find(I, false)...>(oLow, oHigh) + simd::Picked<Find(I, true)...>(oLow, oHigh);
         }
 
         static auto GetSums(const In* pFirst, const In* pSecond)
@@ -215,8 +148,9 @@ struct Reduction
             if constexpr (std::is_same_v<In, std::uint8_t> && HAS_BYTE_SUMS<N, LANES>)
                 return SumBytes<N>(pFirst, pSecond, std::integral_constant<std::size_t, LANES>());
             else
-                return AddPairs(Load<Sum, LANES>(pFirst) + Load<Sum, LANES>(pSecond),
-                                Load<Sum, LANES>(pFirst + INPUT - LANES) + Load<Sum, LANES>(pSecond + INPUT - LANES),
+                return AddPairs(simd::LoadWidened<Sum, LANES>(pFirst) + simd::LoadWidened<Sum, LANES>(pSecond),
+                                simd::LoadWidened<Sum, LANES>(pFirst + INPUT - LANES) +
+                                    simd::LoadWidened<Sum, LANES>(pSecond + INPUT - LANES),
                                 std::make_index_sequence<LANES>());
         }
 
@@ -226,7 +160,7 @@ struct Reduction
             if (pSums != nullptr)
                 Store<OUTPUT, LANES>(pSums, oSums);
             if (pMeans != nullptr)
-                Store<OUTPUT, LANES>(pMeans, __builtin_convertvector(Divide(oSums, nShift), Vector<Mean, LANES>));
+                Store<OUTPUT, LANES>(pMeans, simd::Convert<Mean>(Divide(oSums, nShift)));
         }
     };
 

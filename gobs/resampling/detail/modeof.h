@@ -33,7 +33,9 @@ inline V LargerOf(const V& oOne, const V& oOther)
     return oOne > oOther ? oOne : oOther;
 }
 
-// Of 16 bytes: each is compared with all others at once.
+// Of 16 bytes: each is compared with all others at once, turn after turn.
+//     values    v0 v1 v2 .. v15       turned by one   v1 v2 v3 .. v0      how many of the others are equal: a count
+//     keys      count0 ~v0 | count1 ~v1 | ..          of 16 bits each, of which the largest is the mode's
 inline std::uint8_t ModeOfSixteen(const std::uint8_t* pValues)
 {
     using Bytes = VectorsOf<std::uint8_t>::Samples;
@@ -42,17 +44,17 @@ inline std::uint8_t ModeOfSixteen(const std::uint8_t* pValues)
     std::uint8_t aTwice[32];
     std::memcpy(aTwice, pValues, 16);
     std::memcpy(aTwice + 16, pValues, 16);
-    const auto oValues = LoadVector<Bytes>(pValues);
+    const auto oValues = simd::Load<Bytes>(pValues);
     Bytes oCounts{};
     for (unsigned int n = 1; n < 16; ++n)
-        oCounts -= reinterpret_cast<Bytes>(oValues == LoadVector<Bytes>(aTwice + n));
+        oCounts -= reinterpret_cast<Bytes>(oValues == simd::Load<Bytes>(aTwice + n));
     // The count above, the smaller value below.
     const Bytes oSmaller = ~oValues;
     const auto Keys = [&](unsigned int nFirst)
     {
-        const auto oHigh = LoadVector<Half>(reinterpret_cast<const char*>(&oCounts) + nFirst);
-        const auto oLow = LoadVector<Half>(reinterpret_cast<const char*>(&oSmaller) + nFirst);
-        return (__builtin_convertvector(oHigh, Words) << 8) | __builtin_convertvector(oLow, Words);
+        const auto oHigh = simd::Load<Half>(reinterpret_cast<const char*>(&oCounts) + nFirst);
+        const auto oLow = simd::Load<Half>(reinterpret_cast<const char*>(&oSmaller) + nFirst);
+        return (simd::Convert<std::uint16_t>(oHigh) << 8) | simd::Convert<std::uint16_t>(oLow);
     };
     const Words oKeys = LargerOf<Words>(Keys(0), Keys(8));
     unsigned int nBest = 0;
@@ -80,7 +82,7 @@ inline std::uint8_t ModeByCounts(const std::uint8_t* pValues, std::size_t nValue
     Vector oMost{};
     for (std::size_t n = 0; n < 256; n += LANES)
     {
-        const Vector oSums = LoadVector<Vector>(aCounts[0] + n) + LoadVector<Vector>(aCounts[1] + n);
+        const Vector oSums = simd::Load<Vector>(aCounts[0] + n) + simd::Load<Vector>(aCounts[1] + n);
         std::memcpy(aCounts[0] + n, &oSums, sizeof oSums);
         oMost = LargerOf(oMost, oSums);
     }

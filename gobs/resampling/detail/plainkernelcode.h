@@ -9,14 +9,11 @@
 //     cubic, pixel of 1 p-1  p0   p1   p2    times four weights, then summed across
 
 #include "gobs/resampling/detail/plainkernels.h"
+#include "toolkit/simd/vectors.h"
 
 #include <cstdint>
 #include <cstring>
 #include <type_traits>
-
-#ifdef __SSE4_1__
-#include <immintrin.h>
-#endif
 
 namespace krv::gobs::detail
 {
@@ -24,8 +21,7 @@ namespace krv::gobs::detail
 namespace
 {
 
-typedef float Floats __attribute__((vector_size(16)));      // NOLINT: an attribute of the typedef
-typedef std::int32_t Ints __attribute__((vector_size(16))); // NOLINT
+using Floats = simd::Vector<float, 4>;
 
 // Places that are split into pixels and fractions at a time, on the stack. Measured with AVX2: blocks of 16 cost up to
 // a sixth more, all from 64 to 1024 the same.
@@ -48,29 +44,7 @@ inline Floats LargerOf(const Floats& a, const Floats& b)
 template <typename T>
 inline Floats LoadSamples(const T* p)
 {
-    if constexpr (std::is_same_v<T, float>)
-    {
-        Floats o;
-        std::memcpy(&o, p, sizeof o);
-        return o;
-    }
-#ifdef __SSE4_1__
-    else if constexpr (sizeof(T) == 1)
-    {
-        int nBytes;
-        std::memcpy(&nBytes, p, sizeof nBytes);
-        return _mm_cvtepi32_ps(_mm_cvtepu8_epi32(_mm_cvtsi32_si128(nBytes)));
-    }
-    else
-    {
-        const __m128i oWords = _mm_loadl_epi64(reinterpret_cast<const __m128i*>(p));
-        return _mm_cvtepi32_ps(std::is_signed_v<T> ? _mm_cvtepi16_epi32(oWords) : _mm_cvtepu16_epi32(oWords));
-    }
-#else
-    else
-        return Floats{static_cast<float>(p[0]), static_cast<float>(p[1]), static_cast<float>(p[2]),
-                      static_cast<float>(p[3])};
-#endif
+    return simd::LoadWidened<float, 4>(p);
 }
 
 template <typename T>
@@ -92,19 +66,17 @@ template <typename T>
 inline void StoreFour(T* p, const Floats& oValues)
 {
     if constexpr (std::is_same_v<T, float>)
-        std::memcpy(p, &oValues, sizeof oValues);
-#ifdef __SSE4_1__
+        simd::Store(p, oValues);
+#if defined(KRV_VECTORS)
     else
     {
-        const __m128i oInts = _mm_cvtps_epi32(oValues);
-        const __m128i oWords = std::is_signed_v<T> ? _mm_packs_epi32(oInts, oInts) : _mm_packus_epi32(oInts, oInts);
+        using Word = std::conditional_t<std::is_signed_v<T>, std::int16_t, std::uint16_t>;
+        const auto oInts = simd::RoundInts(oValues);
+        const auto oWords = simd::Pack<Word>(oInts, oInts);
         if constexpr (sizeof(T) == 1)
-        {
-            const int nBytes = _mm_cvtsi128_si32(_mm_packus_epi16(oWords, oWords));
-            std::memcpy(p, &nBytes, 4);
-        }
+            simd::StoreFirst<4>(p, simd::Pack<T>(oWords, oWords));
         else
-            _mm_storel_epi64(reinterpret_cast<__m128i*>(p), oWords);
+            simd::StoreFirst<8>(p, oWords);
     }
 #else
     else
@@ -273,8 +245,8 @@ struct Cubic
         const float nSum = (oSum[0] + oSum[2]) + (oSum[1] + oSum[3]);
         if (!bClamp)
             return nSum;
-        oLow = SmallerOf(oLow, __builtin_shufflevector(oLow, oLow, 2, 3, 0, 1));
-        oHigh = LargerOf(oHigh, __builtin_shufflevector(oHigh, oHigh, 2, 3, 0, 1));
+        oLow = SmallerOf(oLow, simd::Picked<2, 3, 0, 1>(oLow));
+        oHigh = LargerOf(oHigh, simd::Picked<2, 3, 0, 1>(oHigh));
         const float nLow = oLow[0] < oLow[1] ? oLow[0] : oLow[1], nHigh = oHigh[0] > oHigh[1] ? oHigh[0] : oHigh[1];
         return nSum < nLow ? nLow : (nSum > nHigh ? nHigh : nSum);
     }

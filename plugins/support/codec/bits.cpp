@@ -2,7 +2,7 @@
 
 #include "toolkit/raster/swapbytes.h"
 #include "toolkit/simd/memoryaccess.h"
-#include "toolkit/simd/vector16.h"
+#include "toolkit/simd/vectors.h"
 
 #include <algorithm>
 #include <array>
@@ -67,57 +67,62 @@ struct NarrowFloat
     static constexpr std::uint32_t STEP = (128U - (1U << (nExponentBits - 1)) + 1 - nFractionBits) << 23;
 };
 
-#if defined(KRV_VECTOR16)
-using simd::LoadVector;
+#if defined(KRV_VECTORS)
+using simd::As;
+using simd::Bytes;
 using simd::Shuffle;
-using simd::StoreVector;
-using simd::Vector;
+using Ints = simd::Vector<std::int32_t, 4>;
+using Numbers = simd::Vector<std::uint32_t, 4>;
 
 constexpr unsigned int WIDEST_IN_VECTORS = 25; // with seven bits in front of it, a sample still fits four bytes
 
-// Takes four samples of nBits bits, of which the first begins nPhase bits into the first of sixteen bytes.
+// Takes four samples of nBits bits, of which the first begins nPhase bits into the first of sixteen bytes. Of 12 bits:
+//     bytes      s0 s0|s1 s1 s2 s2|s3 s3 ..                 the samples' bits, most significant first
+//     integers   the four bytes from each sample's first on, the first byte highest
+//     times      1, 2^4, 1, 2^4: each sample at the top     then shifted down to the bottom
 class FourSamples
 {
 public:
-    FourSamples(unsigned int nBits, unsigned int nPhase, bool bSigned)
-        : moDown(_mm_cvtsi32_si128(static_cast<int>(32 - nBits))), mbSigned(bSigned)
+    FourSamples(unsigned int nBits, unsigned int nPhase, bool bSigned) : mbSigned(bSigned)
     {
-        alignas(16) std::int32_t aFactors[4];
+        const std::uint32_t nDown = 32 - nBits;
+        moDown = simd::LoadFirst<4>(&nDown);
         for (unsigned int i = 0; i < 4; ++i)
-            aFactors[i] = 1 << ((nPhase + i * nBits) & 7);
-        moUp = _mm_load_si128(reinterpret_cast<const __m128i*>(aFactors));
+            moUp[i] = 1 << ((nPhase + i * nBits) & 7);
         moBytes = Shuffle::Make([&](std::size_t i) { return (nPhase + i / 4 * nBits) / 8 + 3 - i % 4; });
     }
 
-    Vector Take(Vector oBytes) const
+    Ints Take(Bytes oBytes) const
     {
-        const Vector oTop = _mm_mullo_epi32(moBytes(oBytes), moUp);
-        return mbSigned ? _mm_sra_epi32(oTop, moDown) : _mm_srl_epi32(oTop, moDown);
+        const Ints oTop = As<std::int32_t>(moBytes(oBytes)) * moUp;
+        return mbSigned ? simd::ShiftDown(oTop, moDown) : Ints(simd::ShiftDown(Numbers(oTop), moDown));
     }
 
 private:
     Shuffle moBytes;
-    Vector moUp;
-    Vector moDown;
+    Ints moUp;
+    Bytes moDown;
     bool mbSigned;
 };
 
 // Eight samples, given as words of four bytes, in words of the size of Signed.
 template <typename Signed>
-void StoreEight(unsigned char* destination, Vector oFirst, Vector oSecond, bool bSigned)
+void StoreEight(unsigned char* destination, Ints oFirst, Ints oSecond, bool bSigned)
 {
     if constexpr (sizeof(Signed) == 4)
     {
-        StoreVector(destination, oFirst);
-        StoreVector(destination + 16, oSecond);
+        Store(destination, oFirst);
+        Store(destination + 16, oSecond);
         return;
     }
-    const Vector oWords = bSigned ? _mm_packs_epi32(oFirst, oSecond) : _mm_packus_epi32(oFirst, oSecond);
+    const auto oWords = bSigned ? simd::Pack<std::int16_t>(oFirst, oSecond)
+                                : As<std::int16_t>(simd::Pack<std::uint16_t>(oFirst, oSecond));
     if constexpr (sizeof(Signed) == 2)
-        StoreVector(destination, oWords);
+        Store(destination, oWords);
+    else if (bSigned)
+        simd::StoreFirst<8>(destination, simd::Pack<std::int8_t>(oWords, oWords));
     else
-        Store(destination, bSigned ? _mm_cvtsi128_si64(_mm_packs_epi16(oWords, oWords))
-                                   : _mm_cvtsi128_si64(_mm_packus_epi16(oWords, oWords)));
+        simd::StoreFirst<8>(destination, simd::Pack<std::uint8_t>(oWords, oWords));
 }
 
 // Eight samples at a time, which take nBits bytes, from the beginning of a row on. Returns the samples done.
@@ -129,8 +134,8 @@ std::size_t UnpackVectors(const unsigned char* source, std::size_t nBytes, unsig
     const std::size_t nSecond = nBits / 2;
     std::size_t i = 0;
     for (std::size_t nAt = 0; i + 8 <= nSamples && nAt + nSecond + 16 <= nBytes; i += 8, nAt += nBits)
-        StoreEight<Signed>(destination + i * sizeof(Signed), oFirst.Take(LoadVector(source + nAt)),
-                           oSecond.Take(LoadVector(source + nAt + nSecond)), bSigned);
+        StoreEight<Signed>(destination + i * sizeof(Signed), oFirst.Take(Load<Bytes>(source + nAt)),
+                           oSecond.Take(Load<Bytes>(source + nAt + nSecond)), bSigned);
     return i;
 }
 
@@ -146,15 +151,17 @@ std::size_t UnpackVectors(const BitSource& oSource, std::uint64_t nBit, unsigned
                    : UnpackVectors<Signed, false>(row, nBytes, destination, nSamples, nBits);
 }
 
-// Four integers of three bytes, out of the first twelve bytes, as words of four.
+// Four integers of three bytes, out of the first twelve bytes, as words of four. Big-endian:
+//     bytes      a2 a1 a0 b2 b1 b0 ..
+//     integers   0 a0 a1 a2 | 0 b0 b1 b2 | ..      then shifted down by a byte
 template <bool bBigEndian, bool bSigned>
-Vector TakeFour24(const unsigned char* source)
+Numbers TakeFour24(const unsigned char* source)
 {
     static constexpr Shuffle TOP =
         Shuffle::Make([](std::size_t i)
                       { return i % 4 == 0 ? std::size_t{0x80} : i / 4 * 3 + (bBigEndian ? 3 - i % 4 : i % 4 - 1); });
-    const Vector oTop = TOP(LoadVector(source));
-    return bSigned ? _mm_srai_epi32(oTop, 8) : _mm_srli_epi32(oTop, 8);
+    const Bytes oTop = TOP(Load<Bytes>(source));
+    return bSigned ? As<std::uint32_t>(As<std::int32_t>(oTop) >> 8) : As<std::uint32_t>(oTop) >> 8;
 }
 
 template <bool bBigEndian, bool bSigned>
@@ -162,25 +169,24 @@ std::size_t Unpack24Vectors(const unsigned char* source, unsigned char* destinat
 {
     std::size_t i = 0;
     for (; i + 6 <= nCount; i += 4)
-        StoreVector(destination + i * 4, TakeFour24<bBigEndian, bSigned>(source + i * 3));
+        Store(destination + i * 4, TakeFour24<bBigEndian, bSigned>(source + i * 3));
     return i;
 }
 
-// Four numbers with fewer exponent and fraction bits as ones of 32 bits.
+// Four numbers with fewer exponent and fraction bits as ones of 32 bits, one in each lane: normal ones by shifting, the
+// smallest ones by a multiplication, and what is infinite or no number with the gap of the exponents twice.
 template <unsigned int nExponentBits, unsigned int nFractionBits>
-Vector WidenFour(Vector oNumbers)
+Numbers WidenFour(Numbers oNumbers)
 {
     using Format = NarrowFloat<nExponentBits, nFractionBits>;
-    const Vector oMagnitude = _mm_and_si128(oNumbers, _mm_set1_epi32(Format::MAGNITUDE));
-    const Vector oSign =
-        _mm_slli_epi32(_mm_andnot_si128(_mm_set1_epi32(Format::MAGNITUDE), oNumbers), Format::SIGN_SHIFT);
-    const Vector oGap = _mm_set1_epi32(Format::BIAS_GAP);
-    const __m128 oSmall = _mm_mul_ps(_mm_cvtepi32_ps(oMagnitude), _mm_castsi128_ps(_mm_set1_epi32(Format::STEP)));
-    const Vector oNormal = _mm_add_epi32(_mm_slli_epi32(oMagnitude, 23 - nFractionBits), oGap);
-    const Vector oIsSmall = _mm_cmplt_epi32(oMagnitude, _mm_set1_epi32(Format::SMALLEST_NORMAL));
-    const Vector oFinite = _mm_blendv_epi8(oNormal, _mm_castps_si128(oSmall), oIsSmall);
-    const Vector oIsInfinite = _mm_cmpgt_epi32(oMagnitude, _mm_set1_epi32(Format::INFINITE - 1));
-    return _mm_or_si128(_mm_add_epi32(oFinite, _mm_and_si128(oIsInfinite, oGap)), oSign);
+    const Numbers oMagnitude = oNumbers & Format::MAGNITUDE;
+    const Numbers oSign = (oNumbers & ~Format::MAGNITUDE) << Format::SIGN_SHIFT;
+    const auto oSmall = simd::Convert<float>(Ints(oMagnitude)) * std::bit_cast<float>(Format::STEP);
+    const Numbers oNormal = (oMagnitude << (23 - nFractionBits)) + Format::BIAS_GAP;
+    const auto oIsSmall = Ints(oMagnitude) < static_cast<std::int32_t>(Format::SMALLEST_NORMAL);
+    const Numbers oFinite = simd::Select(oIsSmall, As<std::uint32_t>(oSmall), oNormal);
+    const auto oIsInfinite = Ints(oMagnitude) > static_cast<std::int32_t>(Format::INFINITE - 1);
+    return (oFinite + (Numbers(oIsInfinite) & Format::BIAS_GAP)) | oSign;
 }
 
 std::size_t WidenHalfs(const unsigned char* source, unsigned char* destination, std::size_t nCount)
@@ -188,9 +194,10 @@ std::size_t WidenHalfs(const unsigned char* source, unsigned char* destination, 
     std::size_t i = 0;
     for (; i + 8 <= nCount; i += 8)
     {
-        const Vector oHalfs = LoadVector(source + i * 2), oNone = _mm_setzero_si128();
-        StoreVector(destination + i * 4, WidenFour<5, 10>(_mm_unpacklo_epi16(oHalfs, oNone)));
-        StoreVector(destination + i * 4 + 16, WidenFour<5, 10>(_mm_unpackhi_epi16(oHalfs, oNone)));
+        const auto oHalfs = Load<Bytes>(source + i * 2);
+        Store(destination + i * 4, WidenFour<5, 10>(As<std::uint32_t>(simd::MixLow<std::uint16_t>(oHalfs, Bytes{}))));
+        Store(destination + i * 4 + 16,
+              WidenFour<5, 10>(As<std::uint32_t>(simd::MixHigh<std::uint16_t>(oHalfs, Bytes{}))));
     }
     return i;
 }
@@ -199,23 +206,24 @@ std::size_t Widen24s(const unsigned char* source, unsigned char* destination, st
 {
     std::size_t i = 0;
     for (; i + 6 <= nCount; i += 4)
-        StoreVector(destination + i * 4, WidenFour<7, 16>(TakeFour24<false, false>(source + i * 3)));
+        Store(destination + i * 4, WidenFour<7, 16>(TakeFour24<false, false>(source + i * 3)));
     return i;
 }
 
+// The bits of each byte turned round, by a table of halves of bytes:
+//     bytes   h l | ..      turned halves   turned(l) turned(h) | ..
 std::size_t ReverseVectors(const unsigned char* source, unsigned char* destination, std::size_t nBytes)
 {
     static constexpr Shuffle TURNED =
         Shuffle::Make([](std::size_t i) { return (i & 1) << 3 | (i & 2) << 1 | (i & 4) >> 1 | (i & 8) >> 3; });
-    const Vector oTurned = LoadVector(TURNED.moIndices);
-    const Vector oLowBits = _mm_set1_epi8(15);
+    const auto oTurned = Load<Bytes>(TURNED.moIndices);
     std::size_t i = 0;
     for (; i + 16 <= nBytes; i += 16)
     {
-        const Vector oBytes = LoadVector(source + i);
-        const Vector oLow = _mm_shuffle_epi8(oTurned, _mm_and_si128(oBytes, oLowBits));
-        const Vector oHigh = _mm_shuffle_epi8(oTurned, _mm_and_si128(_mm_srli_epi16(oBytes, 4), oLowBits));
-        StoreVector(destination + i, _mm_or_si128(_mm_slli_epi16(oLow, 4), oHigh));
+        const auto oBytes = Load<Bytes>(source + i);
+        const Bytes oLow = simd::PickBytes(oTurned, oBytes & 15);
+        const Bytes oHigh = simd::PickBytes(oTurned, As<std::uint8_t>(As<std::uint16_t>(oBytes) >> 4) & 15);
+        Store(destination + i, As<std::uint8_t>(As<std::uint16_t>(oLow) << 4) | oHigh);
     }
     return i;
 }
@@ -274,18 +282,16 @@ void UnpackSingleBits(const unsigned char* source, std::size_t nBytes, unsigned 
 {
     const std::size_t nWhole = std::min(nBytes, nSamples / 8);
     std::size_t i = 0;
-#if defined(KRV_VECTOR16)
+#if defined(KRV_VECTORS)
     static constexpr Shuffle FIRST = Shuffle::Make([](std::size_t k) { return k / 8; });
-    const Vector oBits = _mm_set1_epi64x(0x0102040810204080);
-    const Vector oOne = _mm_set1_epi8(1);
-    const Vector oTwo = _mm_set1_epi8(2);
+    const auto oBits = As<std::uint8_t>(simd::Spread<simd::Vector<std::uint64_t, 2>>(0x0102040810204080));
+    const auto oOne = simd::Spread<Bytes>(1);
     for (; i + 16 <= nWhole; i += 16)
     {
-        const Vector oBytes = LoadVector(source + i);
-        Vector oPlaces = LoadVector(FIRST.moIndices);
-        for (std::size_t k = 0; k < 8; ++k, oPlaces = _mm_add_epi8(oPlaces, oTwo))
-            StoreVector(destination + i * 8 + k * 16,
-                        _mm_min_epu8(_mm_and_si128(_mm_shuffle_epi8(oBytes, oPlaces), oBits), oOne));
+        const auto oBytes = Load<Bytes>(source + i);
+        auto oPlaces = Load<Bytes>(FIRST.moIndices);
+        for (std::size_t k = 0; k < 8; ++k, oPlaces += 2)
+            Store(destination + i * 8 + k * 16, simd::Smaller(simd::PickBytes(oBytes, oPlaces) & oBits, oOne));
     }
 #endif
     for (; i < nWhole; ++i)

@@ -2,7 +2,7 @@
 
 #include "toolkit/raster/interleave.h"
 #include "toolkit/simd/memoryaccess.h"
-#include "toolkit/simd/vector16.h"
+#include "toolkit/simd/vectors.h"
 
 #include <array>
 #include <utility>
@@ -53,18 +53,15 @@ void ApplyPlain(const unsigned char* source, unsigned char* destination, std::si
     }
 }
 
-#if defined(KRV_VECTOR16)
-using simd::Add;
-using simd::LoadVector;
-using simd::StoreVector;
-using simd::Subtract;
-using simd::Vector;
+#if defined(KRV_VECTORS)
+template <typename T>
+using Samples = simd::Vector<T, 16 / sizeof(T)>;
 
 template <typename T, bool bSwap>
-Vector LoadSamples(const unsigned char* source)
+Samples<T> LoadSamples(const unsigned char* source)
 {
-    const Vector oValue = LoadVector(source);
-    return bSwap ? simd::SwapVector<T>(oValue) : oValue;
+    const auto oValue = Load<Samples<T>>(source);
+    return bSwap ? simd::SwapBytes<T>(oValue) : oValue;
 }
 
 // Running sums within one vector, by adding it to itself shifted by one, two, four ... pixels:
@@ -72,16 +69,16 @@ Vector LoadSamples(const unsigned char* source)
 //     by one        d0 d0+d1 d1+d2    d2+d3       ..
 //     by two        d0 d0+d1 d0+d1+d2 d0+d1+d2+d3 ..
 template <typename T, std::size_t nStride>
-Vector Accumulate(Vector oValue)
+Samples<T> Accumulate(Samples<T> oValue)
 {
     if constexpr (nStride < 16)
-        oValue = Add<T>(oValue, _mm_slli_si128(oValue, nStride));
+        oValue += simd::MoveUp<nStride>(oValue);
     if constexpr (nStride * 2 < 16)
-        oValue = Add<T>(oValue, _mm_slli_si128(oValue, nStride * 2));
+        oValue += simd::MoveUp<nStride * 2>(oValue);
     if constexpr (nStride * 4 < 16)
-        oValue = Add<T>(oValue, _mm_slli_si128(oValue, nStride * 4));
+        oValue += simd::MoveUp<nStride * 4>(oValue);
     if constexpr (nStride * 8 < 16)
-        oValue = Add<T>(oValue, _mm_slli_si128(oValue, nStride * 8));
+        oValue += simd::MoveUp<nStride * 8>(oValue);
     return oValue;
 }
 
@@ -92,13 +89,12 @@ void UndoNarrow(const unsigned char* source, unsigned char* destination, std::si
 {
     static constexpr simd::Shuffle CARRY =
         simd::Shuffle::Make([](std::size_t i) { return 16 - nStride + i % nStride; });
-    Vector oSum = _mm_setzero_si128();
+    Samples<T> oSum{};
     std::size_t i = 0;
     for (; i + 16 <= nBytes; i += 16)
     {
-        const Vector oPart = Accumulate<T, nStride>(LoadSamples<T, bSwap>(source + i));
-        oSum = Add<T>(oPart, CARRY(oSum));
-        StoreVector(destination + i, oSum);
+        oSum = Accumulate<T, nStride>(LoadSamples<T, bSwap>(source + i)) + CARRY(oSum);
+        Store(destination + i, oSum);
     }
     UndoPlain<T, bSwap>(source, destination, i, nBytes, nStride);
 }
@@ -108,13 +104,13 @@ void UndoNarrow(const unsigned char* source, unsigned char* destination, std::si
 template <typename T, bool bSwap, std::size_t nVectors>
 void UndoWide(const unsigned char* source, unsigned char* destination, std::size_t nBytes, std::size_t nStride)
 {
-    Vector aSums[nVectors] = {};
+    Samples<T> aSums[nVectors] = {};
     for (std::size_t i = 0; i < nBytes; i += nStride)
     {
         for (std::size_t k = 0; k < nVectors; ++k)
-            aSums[k] = Add<T>(aSums[k], LoadSamples<T, bSwap>(source + i + (k + 1 < nVectors ? k * 16 : nStride - 16)));
+            aSums[k] += LoadSamples<T, bSwap>(source + i + (k + 1 < nVectors ? k * 16 : nStride - 16));
         for (std::size_t k = 0; k < nVectors; ++k)
-            StoreVector(destination + i + (k + 1 < nVectors ? k * 16 : nStride - 16), aSums[k]);
+            Store(destination + i + (k + 1 < nVectors ? k * 16 : nStride - 16), aSums[k]);
     }
 }
 
@@ -125,7 +121,7 @@ void UndoVeryWide(const unsigned char* source, unsigned char* destination, std::
     UndoPlain<T, bSwap>(source, destination, 0, nStride, nStride);
     std::size_t i = nStride;
     for (; i + 16 <= nBytes; i += 16)
-        StoreVector(destination + i, Add<T>(LoadSamples<T, bSwap>(source + i), LoadVector(destination + i - nStride)));
+        Store(destination + i, LoadSamples<T, bSwap>(source + i) + Load<Samples<T>>(destination + i - nStride));
     UndoPlain<T, bSwap>(source, destination, i, nBytes, nStride);
 }
 
@@ -136,8 +132,8 @@ void ApplyRow(const unsigned char* source, unsigned char* destination, std::size
     for (; i >= nStride + 16; i -= 16)
     {
         const unsigned char* at = source + i - 16;
-        const Vector oValue = Subtract<T>(LoadVector(at), LoadVector(at - nStride));
-        StoreVector(destination + i - 16, bSwap ? simd::SwapVector<T>(oValue) : oValue);
+        const auto oValue = Load<Samples<T>>(at) - Load<Samples<T>>(at - nStride);
+        Store(destination + i - 16, bSwap ? simd::SwapBytes<T>(oValue) : oValue);
     }
     ApplyPlain<T, bSwap>(source, destination, i, nStride);
 }

@@ -1,13 +1,11 @@
 #include "toolkit/core/detail/edgebatch.h"
 
+#include "toolkit/simd/vectors.h"
+
 #include <algorithm>
 #include <bit>
 #include <cmath>
 #include <cstring>
-
-#ifdef __SSE4_1__
-#include <immintrin.h>
-#endif
 
 namespace krv::core::detail
 {
@@ -18,16 +16,7 @@ namespace
 constexpr double GREATEST = std::numeric_limits<double>::max();
 
 constexpr std::size_t LANES = 2;
-using Doubles = double __attribute__((vector_size(LANES * sizeof(double))));
-using Ints = std::int32_t __attribute__((vector_size(LANES * sizeof(std::int32_t))));
-
-template <typename TVector, typename TArray>
-TVector Load(const TArray& oArray, std::size_t i)
-{
-    TVector oVector;
-    std::memcpy(&oVector, &oArray[i], sizeof oVector);
-    return oVector;
-}
+using Doubles = simd::Vector<double, LANES>;
 
 Doubles Lesser(Doubles a, Doubles b)
 {
@@ -39,43 +28,40 @@ Doubles Greater(Doubles a, Doubles b)
     return a > b ? a : b;
 }
 
-#ifdef __SSE4_1__
+#if defined(KRV_VECTORS)
 
-// For four flags the bytes of the numbers whose flags are set, moved to the front.
-using Shuffle = std::array<std::uint8_t, 16>;
-constexpr std::array<Shuffle, 16> MakeShuffles()
+// For four flags the bytes of the numbers whose flags are set, moved to the front. Of the flags 1 0 1 1, say:
+//     places   p0 p1 p2 p3      to   p0 p2 p3 p0
+constexpr std::array<simd::Shuffle, 16> MakeShuffles()
 {
-    std::array<Shuffle, 16> oShuffles{};
+    std::array<simd::Shuffle, 16> oShuffles{};
     for (std::size_t nFlags = 0; nFlags < 16; ++nFlags)
     {
         std::size_t nTo = 0;
         for (std::size_t i = 0; i < 16; ++i)
         {
             if ((nFlags >> i / 4 & 1) != 0)
-                oShuffles[nFlags][nTo++] = static_cast<std::uint8_t>(i);
+                oShuffles[nFlags].moIndices[nTo++] = static_cast<unsigned char>(i);
         }
     }
     return oShuffles;
 }
-alignas(16) constexpr std::array<Shuffle, 16> SHUFFLES = MakeShuffles();
+constexpr std::array<simd::Shuffle, 16> SHUFFLES = MakeShuffles();
 
 // The places where a row differs from the one before it, 0 for the second of all. Reads and writes up to three more.
 std::size_t FindChanges(const std::int32_t* pnRows, std::size_t nCount, std::uint32_t* pnChanges)
 {
     std::size_t nChanges = 0;
-    __m128i oPlaces = _mm_setr_epi32(0, 1, 2, 3);
+    using Rows = simd::Vector<std::int32_t, 4>;
+    Rows oPlaces{0, 1, 2, 3};
     for (std::size_t i = 0; i < nCount; i += 4)
     {
-        const __m128i oBefore = _mm_loadu_si128(reinterpret_cast<const __m128i*>(pnRows + i));
-        const __m128i oRows = _mm_loadu_si128(reinterpret_cast<const __m128i*>(pnRows + i + 1));
-        unsigned int nFlags =
-            15u ^ static_cast<unsigned int>(_mm_movemask_ps(_mm_castsi128_ps(_mm_cmpeq_epi32(oBefore, oRows))));
+        unsigned int nFlags = 15u ^ simd::TopBits(simd::Load<Rows>(pnRows + i) == simd::Load<Rows>(pnRows + i + 1));
         if (nCount - i < 4)
             nFlags &= (1u << (nCount - i)) - 1;
-        const __m128i oShuffle = _mm_load_si128(reinterpret_cast<const __m128i*>(SHUFFLES[nFlags].data()));
-        _mm_storeu_si128(reinterpret_cast<__m128i*>(pnChanges + nChanges), _mm_shuffle_epi8(oPlaces, oShuffle));
+        simd::Store(pnChanges + nChanges, SHUFFLES[nFlags](simd::As<std::uint8_t>(oPlaces)));
         nChanges += static_cast<std::size_t>(std::popcount(nFlags));
-        oPlaces = _mm_add_epi32(oPlaces, _mm_set1_epi32(4));
+        oPlaces += 4;
     }
     return nChanges;
 }
@@ -131,6 +117,8 @@ void EdgeBatch::Take(const GDBVertex& oBefore, const GDBVertex* poVertices, std:
     moRows[0] = moRows[nCount];
 }
 
+// Two edges at a time, the lists of their ends side by side:
+//     upper x, upper y, lower x, lower y, rows   e0 e1 | e2 e3 | ..     to     x, slope   e0 e1 | e2 e3 | ..
 bool EdgeBatch::Compute()
 {
     // To whole vectors by the last edge again.
@@ -145,10 +133,10 @@ bool EdgeBatch::Compute()
     auto oBad = oLeft < oLeft;
     for (std::size_t i = 0; i < mnCount; i += LANES)
     {
-        const auto oUpperX = Load<Doubles>(moUpperX, i), oUpperY = Load<Doubles>(moUpperY, i);
-        const auto oLowerX = Load<Doubles>(moLowerX, i), oLowerY = Load<Doubles>(moLowerY, i);
-        const auto oFirst = __builtin_convertvector(Load<Ints>(moFirstRows, i), Doubles);
-        const auto oLast = __builtin_convertvector(Load<Ints>(moLastRows, i), Doubles);
+        const auto oUpperX = simd::Load<Doubles>(&moUpperX[i]), oUpperY = simd::Load<Doubles>(&moUpperY[i]);
+        const auto oLowerX = simd::Load<Doubles>(&moLowerX[i]), oLowerY = simd::Load<Doubles>(&moLowerY[i]);
+        const auto oFirst = simd::LoadWidened<double, LANES>(&moFirstRows[i]);
+        const auto oLast = simd::LoadWidened<double, LANES>(&moLastRows[i]);
         const Doubles oDeltaX = oLowerX - oUpperX, oDeltaY = oLowerY - oUpperY, oSum = oDeltaX + oDeltaY;
         oBad |= oSum - oSum != 0;
         const Doubles oSlope = Greater(Doubles{} - GREATEST, Lesser(Doubles{} + GREATEST, oDeltaX / oDeltaY));
@@ -157,8 +145,8 @@ bool EdgeBatch::Compute()
         const Doubles oEnd = oX + (oLast - oFirst) * oSlope;
         oLeft = Lesser(oLeft, Lesser(oX, oEnd));
         oRight = Greater(oRight, Greater(oX, oEnd));
-        std::memcpy(&moX[i], &oX, sizeof oX);
-        std::memcpy(&moSlopes[i], &oSlope, sizeof oSlope);
+        simd::Store(&moX[i], oX);
+        simd::Store(&moSlopes[i], oSlope);
     }
     for (std::size_t i = 0; i < LANES; ++i)
     {

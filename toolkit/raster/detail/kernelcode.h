@@ -13,10 +13,6 @@
 #include <type_traits>
 #include <utility>
 
-#ifdef __SSE4_1__
-#include <immintrin.h>
-#endif
-
 namespace krv::raster::detail
 {
 
@@ -41,7 +37,7 @@ inline std::size_t ConvertRounded([[maybe_unused]] const unsigned char* pSource,
                                   [[maybe_unused]] unsigned char* pTarget, [[maybe_unused]] std::size_t nCount)
 {
     std::size_t i = 0;
-#ifdef __SSE4_1__
+#if defined(KRV_VECTORS)
     if constexpr (std::is_floating_point_v<TSource> && std::is_integral_v<TTarget> && sizeof(TTarget) <= 4)
     {
         constexpr std::size_t LANES = ROUNDED_VALUES<TTarget>;
@@ -124,7 +120,7 @@ std::size_t CountChanges(const unsigned char* pSource, const unsigned char* pTar
     return nChanged;
 }
 
-#ifdef __SSE4_1__
+#if defined(KRV_VECTORS)
 
 // Whether a vector's values are converted as they are written; the pairs that mixed files meet in.
 template <typename TSource, typename TTarget>
@@ -144,91 +140,95 @@ inline constexpr bool CAN_STORE<std::int16_t, double> = true;
 template <>
 inline constexpr bool CAN_STORE<float, double> = true;
 
+// As wide a vector as there is, of which each source gives some bytes.
+using MergeVector = simd::Full<std::uint8_t>;
+
+#if defined(__AVX512VBMI__)
+constexpr std::size_t LOAD_BYTES = 64;
+
+struct MergeShuffle
+{
+    MergeVector moFrom;
+    std::uint64_t mnPlaced;
+};
+
+inline MergeVector LoadTerm(const unsigned char* p)
+{
+    return simd::Load<MergeVector>(p);
+}
+inline MergeShuffle LoadShuffle(const unsigned char* p)
+{
+    const auto oFrom = simd::Load<MergeVector>(p);
+    return {oFrom, ~simd::TopBits(oFrom)};
+}
+inline MergeVector AddTerm(MergeVector oResult, MergeVector oLoad, const MergeShuffle& oShuffle)
+{
+    return simd::PickInto(oResult, oShuffle.mnPlaced, oShuffle.moFrom, oLoad);
+}
+#else
+constexpr std::size_t LOAD_BYTES = 16;
+using MergeShuffle = MergeVector;
+
+// The same 16 bytes for all groups.
+inline MergeVector LoadTerm(const unsigned char* p)
+{
+    return simd::SpreadGroup<MergeVector>(simd::Load<simd::Bytes>(p));
+}
+inline MergeShuffle LoadShuffle(const unsigned char* p)
+{
+    return simd::Load<MergeShuffle>(p);
+}
+inline MergeVector AddTerm(MergeVector oResult, MergeVector oLoad, const MergeShuffle& oShuffle)
+{
+    return oResult | simd::PickBytes(oLoad, oShuffle);
+}
+#endif
+
+// The values of a vector that fill vector number N of a wider type.
+template <typename TTarget, std::size_t N, typename V>
+inline auto WidenPart(V o)
+{
+    constexpr std::size_t LANES = simd::VECTOR_BYTES / sizeof(TTarget), BYTES = LANES * sizeof(simd::LaneOf<V>);
+    if constexpr (BYTES >= 16)
+        return simd::Widen<TTarget, LANES>(simd::Part<N * BYTES, BYTES>(o));
+    else
+        return simd::Widen<TTarget, LANES>(simd::MoveDown<N * BYTES % 16>(simd::Part<N * BYTES / 16 * 16, 16>(o)));
+}
+
+// All values of a vector; the shorter vectors make integers of 32 bits first where they become doubles:
+//     bytes   b0 .. b15      integers   i0 .. i3 | i4 .. i7 | ..      doubles   d0 d1 | d2 d3 | ..
+template <typename TTarget, typename V>
+inline void StoreWide(unsigned char* pTarget, V o)
+{
+    using TSource = simd::LaneOf<V>;
+    constexpr bool BY_INTS = simd::VECTOR_BYTES < 64 && sizeof(TSource) < 4 && sizeof(TTarget) == 8;
+    using TStep = std::conditional_t<BY_INTS, std::int32_t, TTarget>;
+    if constexpr (std::is_same_v<TSource, TTarget>)
+        simd::Store(pTarget, o);
+    else
+        [=]<std::size_t... N>(std::index_sequence<N...>)
+        {
+            constexpr std::size_t STEP_BYTES = simd::VECTOR_BYTES * sizeof(TTarget) / sizeof(TStep);
+            (StoreWide<TTarget>(pTarget + N * STEP_BYTES, WidenPart<TStep, N>(o)), ...);
+        }
+    (std::make_index_sequence<sizeof(TStep) / sizeof(TSource)>());
+}
+
 #if defined(__AVX512VBMI__)
 // And the pairs of mixed files that are written, whose values may change: from longer types to shorter ones.
 template <typename TSource, typename TTarget>
 inline constexpr bool CAN_NARROW = !std::is_same_v<TSource, TTarget> && sizeof(TSource) > 1 &&
                                    sizeof(TTarget) <= sizeof(TSource) &&
                                    (std::is_integral_v<TSource> ? std::is_integral_v<TTarget> : sizeof(TTarget) <= 4);
-using MergeVector = __m512i;
-constexpr std::size_t LOAD_BYTES = 64;
-
-struct MergeShuffle
-{
-    __m512i moFrom;
-    __mmask64 mnPlaced;
-};
-
-inline MergeVector LoadTerm(const unsigned char* p)
-{
-    return _mm512_loadu_si512(p);
-}
-inline MergeShuffle LoadShuffle(const unsigned char* p)
-{
-    const __m512i oFrom = _mm512_loadu_si512(p);
-    return {oFrom, ~_mm512_movepi8_mask(oFrom)};
-}
-inline MergeVector AddTerm(MergeVector oResult, MergeVector oLoad, const MergeShuffle& oShuffle)
-{
-    return _mm512_mask_permutexvar_epi8(oResult, oShuffle.mnPlaced, oShuffle.moFrom, oLoad);
-}
-
-// The first values of a vector that fill one of the target.
-inline __m512i WideInts(__m512i o, std::uint8_t, float)
-{
-    return _mm512_cvtepu8_epi32(_mm512_castsi512_si128(o));
-}
-inline __m512i WideInts(__m512i o, std::uint16_t, float)
-{
-    return _mm512_cvtepu16_epi32(_mm512_castsi512_si256(o));
-}
-inline __m512i WideInts(__m512i o, std::int16_t, float)
-{
-    return _mm512_cvtepi16_epi32(_mm512_castsi512_si256(o));
-}
-inline __m256i WideInts(__m512i o, std::uint8_t, double)
-{
-    return _mm256_cvtepu8_epi32(_mm512_castsi512_si128(o));
-}
-inline __m256i WideInts(__m512i o, std::uint16_t, double)
-{
-    return _mm256_cvtepu16_epi32(_mm512_castsi512_si128(o));
-}
-inline __m256i WideInts(__m512i o, std::int16_t, double)
-{
-    return _mm256_cvtepi16_epi32(_mm512_castsi512_si128(o));
-}
-
-template <typename TSource>
-inline void StorePart(float* p, __m512i o)
-{
-    _mm512_storeu_ps(p, _mm512_cvtepi32_ps(WideInts(o, TSource(), float())));
-}
-template <typename TSource>
-inline void StorePart(double* p, __m512i o)
-{
-    if constexpr (std::is_same_v<TSource, float>)
-        _mm512_storeu_pd(p, _mm512_cvtps_pd(_mm256_castsi256_ps(_mm512_castsi512_si256(o))));
-    else
-        _mm512_storeu_pd(p, _mm512_cvtepi32_pd(WideInts(o, TSource(), double())));
-}
-
-template <typename T, std::size_t N>
-struct Lanes
-{
-    typedef T Type __attribute__((vector_size(N * sizeof(T))));
-};
 
 // Stores values as those of a type that is no longer. Returns -1 in the lane of each that changed, 0 in the others.
 template <typename TSource, typename TTarget>
 inline auto StoreNarrow(unsigned char* pTarget, MergeVector o)
 {
     using Limits = std::numeric_limits<TTarget>;
+    using Source = simd::Full<TSource>;
     constexpr std::size_t N = sizeof(MergeVector) / sizeof(TSource);
-    using Source = typename Lanes<TSource, N>::Type;
-    using Target = typename Lanes<TTarget, N>::Type;
-    const Source oFrom = __builtin_bit_cast(Source, o);
-    Target oTo;
+    const Source oFrom = simd::As<TSource>(o);
     decltype(oFrom != oFrom) oChanged;
     if constexpr (std::is_integral_v<TSource>)
     {
@@ -236,191 +236,43 @@ inline auto StoreNarrow(unsigned char* pTarget, MergeVector o)
         if constexpr (std::is_signed_v<TSource>)
         {
             const auto nLowest = ConvertValue<TSource>(Limits::min());
-            oKept = oKept < nLowest ? Source{} + nLowest : oKept;
+            oKept = simd::Larger(oKept, simd::Spread<Source>(nLowest));
         }
         const auto nMost = ConvertValue<TSource>(Limits::max());
-        oKept = oKept > nMost ? Source{} + nMost : oKept;
+        oKept = simd::Smaller(oKept, simd::Spread<Source>(nMost));
         oChanged = oKept != oFrom;
-        oTo = __builtin_convertvector(oKept, Target);
+        simd::StoreTruncated<TTarget>(pTarget, oKept);
     }
     else if constexpr (std::is_integral_v<TTarget>)
     {
         using Whole = std::conditional_t<std::is_signed_v<TTarget>, std::int32_t, std::uint32_t>;
-        using Wholes = typename Lanes<Whole, N>::Type;
-        Wholes oKept;
-        if constexpr (sizeof(TSource) == 4)
-            oKept = __builtin_bit_cast(Wholes, IntsOf<TTarget>(_mm512_castsi512_ps(o)));
-        else
-            oKept = __builtin_bit_cast(Wholes, IntsOf<TTarget>(_mm512_castsi512_pd(o)));
+        using Wholes = simd::Vector<Whole, N>;
+        Wholes oKept = simd::As<Whole>(IntsOf<TTarget>(oFrom));
         constexpr Whole LOWEST = Limits::min(), MOST = Limits::max();
         if constexpr (sizeof(TTarget) < 4 && LOWEST != 0)
-            oKept = oKept < LOWEST ? Wholes{} + LOWEST : oKept;
+            oKept = simd::Larger(oKept, simd::Spread<Wholes>(LOWEST));
         if constexpr (sizeof(TTarget) < 4)
-            oKept = oKept > MOST ? Wholes{} + MOST : oKept;
+            oKept = simd::Smaller(oKept, simd::Spread<Wholes>(MOST));
         Source oBack;
         if constexpr (sizeof(TSource) == 4)
-            oBack = __builtin_convertvector(oKept, Source);
-        else if constexpr (LOWEST != 0) // GCC takes these apart
-            oBack = __builtin_bit_cast(Source, _mm512_cvtepi32_pd(__builtin_bit_cast(__m256i, oKept)));
+            oBack = simd::Convert<TSource>(oKept);
         else
-            oBack = __builtin_bit_cast(Source, _mm512_cvtepu32_pd(__builtin_bit_cast(__m256i, oKept)));
+            oBack = simd::Widen<TSource, N>(oKept);
         oChanged = oBack != oFrom;
         if constexpr (sizeof(TTarget) == sizeof(TSource)) // the last whole number is no real, see IsChanged
             oChanged |= oFrom >= static_cast<TSource>(Limits::max() / 2 + 1) * 2;
-        oTo = __builtin_convertvector(oKept, Target);
+        simd::StoreTruncated<TTarget>(pTarget, oKept);
     }
     else
     {
-        oTo = __builtin_convertvector(oFrom, Target);
-        const auto oBack = __builtin_bit_cast(Source, _mm512_cvtps_pd(__builtin_bit_cast(__m256, oTo)));
+        const auto oTo = simd::Convert<TTarget>(oFrom);
+        simd::Store(pTarget, oTo);
+        const auto oBack = simd::Widen<TSource, N>(oTo);
         oChanged = (oBack < oFrom) | (oBack > oFrom);
     }
-    std::memcpy(pTarget, &oTo, sizeof oTo);
     return oChanged;
 }
 
-template <typename TSource, typename TTarget>
-inline void StoreVector(unsigned char* pBytes, MergeVector o)
-{
-    auto* const pTarget = reinterpret_cast<TTarget*>(pBytes);
-    constexpr std::size_t VALUES = 64 / sizeof(TTarget);
-    constexpr std::size_t PARTS = sizeof(TTarget) / sizeof(TSource);
-    if constexpr (PARTS == 1)
-        _mm512_storeu_si512(pTarget, o);
-    else if constexpr (PARTS == 2)
-    {
-        StorePart<TSource>(pTarget, o);
-        StorePart<TSource>(pTarget + VALUES, _mm512_shuffle_i64x2(o, o, 0x0E));
-    }
-    else
-    {
-        // Eighths lie within the quarters of a vector.
-        constexpr std::size_t QUARTER = PARTS / 4;
-        const __m512i oQuarters[4] = {o, _mm512_shuffle_i64x2(o, o, 1), _mm512_shuffle_i64x2(o, o, 2),
-                                      _mm512_shuffle_i64x2(o, o, 3)};
-        for (std::size_t n = 0; n < 4; ++n)
-        {
-            StorePart<TSource>(pTarget + n * QUARTER * VALUES, oQuarters[n]);
-            if constexpr (QUARTER == 2)
-                StorePart<TSource>(pTarget + (n * QUARTER + 1) * VALUES, _mm512_bsrli_epi128(oQuarters[n], 8));
-        }
-    }
-}
-#elif defined(__AVX2__)
-using MergeVector = __m256i;
-using MergeShuffle = __m256i;
-constexpr std::size_t LOAD_BYTES = 16;
-
-// The same 16 bytes for both halves.
-inline MergeVector LoadTerm(const unsigned char* p)
-{
-    return _mm256_broadcastsi128_si256(_mm_loadu_si128(reinterpret_cast<const __m128i*>(p)));
-}
-inline MergeShuffle LoadShuffle(const unsigned char* p)
-{
-    return _mm256_loadu_si256(reinterpret_cast<const __m256i*>(p));
-}
-inline MergeVector AddTerm(MergeVector oResult, MergeVector oLoad, const MergeShuffle& oShuffle)
-{
-    return _mm256_or_si256(oResult, _mm256_shuffle_epi8(oLoad, oShuffle));
-}
-
-inline void StoreEight(float* p, __m256i o)
-{
-    _mm256_storeu_ps(p, _mm256_cvtepi32_ps(o));
-}
-inline void StoreEight(double* p, __m256i o)
-{
-    _mm256_storeu_pd(p, _mm256_cvtepi32_pd(_mm256_castsi256_si128(o)));
-    _mm256_storeu_pd(p + 4, _mm256_cvtepi32_pd(_mm256_extracti128_si256(o, 1)));
-}
-
-template <typename TSource, typename TTarget>
-inline void StoreHalf(TTarget* pTarget, __m128i o)
-{
-    if constexpr (std::is_same_v<TSource, std::uint8_t>)
-    {
-        StoreEight(pTarget, _mm256_cvtepu8_epi32(o));
-        StoreEight(pTarget + 8, _mm256_cvtepu8_epi32(_mm_srli_si128(o, 8)));
-    }
-    else if constexpr (std::is_same_v<TSource, std::uint16_t>)
-        StoreEight(pTarget, _mm256_cvtepu16_epi32(o));
-    else if constexpr (std::is_same_v<TSource, std::int16_t>)
-        StoreEight(pTarget, _mm256_cvtepi16_epi32(o));
-    else
-        _mm256_storeu_pd(pTarget, _mm256_cvtps_pd(_mm_castsi128_ps(o)));
-}
-
-template <typename TSource, typename TTarget>
-inline void StoreVector(unsigned char* pBytes, MergeVector o)
-{
-    if constexpr (std::is_same_v<TSource, TTarget>)
-        _mm256_storeu_si256(reinterpret_cast<__m256i*>(pBytes), o);
-    else
-    {
-        auto* const pTarget = reinterpret_cast<TTarget*>(pBytes);
-        StoreHalf<TSource>(pTarget, _mm256_castsi256_si128(o));
-        StoreHalf<TSource>(pTarget + 16 / sizeof(TSource), _mm256_extracti128_si256(o, 1));
-    }
-}
-#else
-using MergeVector = __m128i;
-using MergeShuffle = __m128i;
-constexpr std::size_t LOAD_BYTES = 16;
-
-inline MergeVector LoadTerm(const unsigned char* p)
-{
-    return _mm_loadu_si128(reinterpret_cast<const __m128i*>(p));
-}
-inline MergeShuffle LoadShuffle(const unsigned char* p)
-{
-    return LoadTerm(p);
-}
-inline MergeVector AddTerm(MergeVector oResult, MergeVector oLoad, const MergeShuffle& oShuffle)
-{
-    return _mm_or_si128(oResult, _mm_shuffle_epi8(oLoad, oShuffle));
-}
-
-inline void StoreFour(float* p, __m128i o)
-{
-    _mm_storeu_ps(p, _mm_cvtepi32_ps(o));
-}
-inline void StoreFour(double* p, __m128i o)
-{
-    _mm_storeu_pd(p, _mm_cvtepi32_pd(o));
-    _mm_storeu_pd(p + 2, _mm_cvtepi32_pd(_mm_unpackhi_epi64(o, o)));
-}
-
-template <typename TSource, typename TTarget>
-inline void StoreVector(unsigned char* pBytes, MergeVector o)
-{
-    auto* const pTarget = reinterpret_cast<TTarget*>(pBytes);
-    const __m128i oUpper = _mm_unpackhi_epi64(o, o);
-    if constexpr (std::is_same_v<TSource, TTarget>)
-        _mm_storeu_si128(reinterpret_cast<__m128i*>(pBytes), o);
-    else if constexpr (std::is_same_v<TSource, std::uint8_t>)
-    {
-        StoreFour(pTarget, _mm_cvtepu8_epi32(o));
-        StoreFour(pTarget + 4, _mm_cvtepu8_epi32(_mm_srli_si128(o, 4)));
-        StoreFour(pTarget + 8, _mm_cvtepu8_epi32(oUpper));
-        StoreFour(pTarget + 12, _mm_cvtepu8_epi32(_mm_srli_si128(o, 12)));
-    }
-    else if constexpr (std::is_same_v<TSource, std::uint16_t>)
-    {
-        StoreFour(pTarget, _mm_cvtepu16_epi32(o));
-        StoreFour(pTarget + 4, _mm_cvtepu16_epi32(oUpper));
-    }
-    else if constexpr (std::is_same_v<TSource, std::int16_t>)
-    {
-        StoreFour(pTarget, _mm_cvtepi16_epi32(o));
-        StoreFour(pTarget + 4, _mm_cvtepi16_epi32(oUpper));
-    }
-    else
-    {
-        _mm_storeu_pd(pTarget, _mm_cvtps_pd(_mm_castsi128_ps(o)));
-        _mm_storeu_pd(pTarget + 2, _mm_cvtps_pd(_mm_castsi128_ps(oUpper)));
-    }
-}
 #endif
 
 // Stores vectors one after the other and counts the values that changed.
@@ -428,7 +280,13 @@ template <typename TSource, typename TTarget>
 class VectorStore
 {
 public:
-    void Put(unsigned char* pTarget, MergeVector o) { StoreVector<TSource, TTarget>(pTarget, o); }
+    void Put(unsigned char* pTarget, MergeVector o)
+    {
+        if constexpr (std::is_same_v<TSource, TTarget>)
+            simd::Store(pTarget, o);
+        else
+            StoreWide<TTarget>(pTarget, simd::As<TSource>(o));
+    }
     std::size_t Count() const { return 0; }
 };
 
@@ -523,9 +381,7 @@ std::size_t Merge(const MergeTerm* pTerms, std::size_t nTerms, unsigned char* pT
     return oStore.Count();
 }
 
-constexpr std::size_t VECTOR_BYTES = sizeof(MergeVector);
 #else
-constexpr std::size_t VECTOR_BYTES = 16;
 constexpr std::size_t LOAD_BYTES = 16;
 #endif
 
@@ -569,7 +425,7 @@ void SwapWords(const unsigned char* pSource, unsigned char* pTarget, std::size_t
 template <std::size_t NSource, std::size_t NTarget>
 constexpr MergeLoop FindMerge()
 {
-#ifdef __SSE4_1__
+#if defined(KRV_VECTORS)
     using TSource = std::tuple_element_t<NSource, PartTypes>;
     using TTarget = std::tuple_element_t<NTarget, PartTypes>;
     if constexpr (CAN_STORE<TSource, TTarget>)
@@ -588,7 +444,7 @@ constexpr Kernels MakeKernels(std::index_sequence<N...>)
     return {{Convert<N / PART_COUNT, N % PART_COUNT>...},
             {CountChanges<N / PART_COUNT, N % PART_COUNT>...},
             {FindMerge<N / PART_COUNT, N % PART_COUNT>()...},
-            VECTOR_BYTES,
+            simd::VECTOR_BYTES,
             LOAD_BYTES,
             {SwapWords<std::uint16_t>, SwapWords<std::uint32_t>, SwapWords<std::uint64_t>}};
 }

@@ -1,6 +1,6 @@
 #include "toolkit/raster/detail/shuffleplan.h"
 
-#include "toolkit/simd/vector16.h"
+#include "toolkit/simd/vectors.h"
 
 #include <algorithm>
 
@@ -12,7 +12,7 @@ namespace
 
 constexpr unsigned char NOTHING = 0x80; // in a table: this byte comes out as 0
 
-#if defined(KRV_VECTOR16)
+#if defined(KRV_VECTORS)
 constexpr bool SHUFFLES = true;
 #else
 constexpr bool SHUFFLES = false;
@@ -59,21 +59,21 @@ ShufflePlan::Step* ShufflePlan::FindStep(std::size_t nOutput, std::size_t nOffse
     return &oSteps[nCount++];
 }
 
-#if defined(KRV_VECTOR16)
+#if defined(KRV_VECTORS)
 template <std::size_t nSteps>
 void ShufflePlan::RunSteps(const unsigned char* source, unsigned char* destination, std::size_t nTurns) const
 {
     for (std::size_t i = 0; i < nTurns; ++i, source += mnInputs * 16)
         for (std::size_t k = 0; k < mnOutputs; ++k, destination += 16)
         {
-            simd::Vector oResult = _mm_setzero_si128();
+            simd::Block oResult{};
             for (std::size_t n = 0; n < nSteps; ++n)
             {
                 const Step& oStep = moSteps[k][n];
-                oResult = _mm_or_si128(oResult, _mm_shuffle_epi8(simd::LoadVector(source + oStep.mnOffset),
-                                                                 simd::LoadVector(oStep.moTable.data())));
+                oResult |= simd::PickBytes(simd::Load<simd::Block>(source + oStep.mnOffset),
+                                           simd::Load<simd::Block>(oStep.moTable.data()));
             }
-            simd::StoreVector(destination, oResult);
+            simd::Store(destination, oResult);
         }
 }
 

@@ -7,7 +7,10 @@ namespace krv::raster::detail
 {
 
 // Picks channels out of pixels by byte shuffles of whole vectors of 16 bytes: worked out once, then run along rows.
-// Each output vector is put together from the input vectors that hold bytes of it.
+// Each output vector is put together from the input vectors that hold bytes of it. Of four channels of 32 bits the
+// third and the first:
+//     input vectors   a0 b0 c0 d0 | a1 b1 c1 d1
+//     shuffled        c0 a0 .  .  | .  .  c1 a1      or    c0 a0 c1 a1
 class ShufflePlan
 {
 public:

@@ -1,10 +1,8 @@
 #include "toolkit/raster/detail/stridedmove.h"
 
-#include <cstring>
+#include "toolkit/simd/vectors.h"
 
-#ifdef __SSSE3__
-#include <immintrin.h>
-#endif
+#include <cstring>
 
 namespace krv::raster::detail
 {
@@ -34,7 +32,7 @@ void Move(const unsigned char* pSource, std::size_t nSourceStride, unsigned char
         One(i);
 }
 
-#ifdef __SSSE3__
+#if defined(KRV_VECTORS)
 
 constexpr unsigned char NOTHING = 0x80; // for a byte shuffle: 0 here
 
@@ -56,7 +54,7 @@ public:
             oShuffles[nFrom / 16][nByte] = static_cast<unsigned char>(nFrom % 16);
         }
         for (std::size_t i = 0; i < STEP; ++i)
-            moShuffles[i] = _mm_load_si128(reinterpret_cast<const __m128i*>(oShuffles[i]));
+            moShuffles[i] = simd::Load<simd::Block>(oShuffles[i]);
     }
 
     // Returns how many runs it moved. The last ones are left: their vectors could reach beyond the end of the source.
@@ -66,17 +64,17 @@ public:
         std::size_t i = 0;
         for (; i + LANES < nRuns; i += LANES)
         {
-            const auto* pFrom = reinterpret_cast<const __m128i*>(pSource + i * N * STEP);
-            __m128i oResult = _mm_shuffle_epi8(_mm_loadu_si128(pFrom), moShuffles[0]);
+            const unsigned char* const pFrom = pSource + i * N * STEP;
+            auto oResult = simd::PickBytes(simd::Load<simd::Block>(pFrom), moShuffles[0]);
             for (std::size_t n = 1; n < STEP; ++n)
-                oResult = _mm_or_si128(oResult, _mm_shuffle_epi8(_mm_loadu_si128(pFrom + n), moShuffles[n]));
-            _mm_storeu_si128(reinterpret_cast<__m128i*>(pTarget + i * N), oResult);
+                oResult |= simd::PickBytes(simd::Load<simd::Block>(pFrom + 16 * n), moShuffles[n]);
+            simd::Store(pTarget + i * N, oResult);
         }
         return i;
     }
 
 private:
-    __m128i moShuffles[STEP];
+    simd::Block moShuffles[STEP];
 };
 
 template <std::size_t N>
