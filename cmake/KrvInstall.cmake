@@ -14,7 +14,7 @@ install(EXPORT krvpluginsupportTargets NAMESPACE krv:: DESTINATION ${KRV_PACKAGE
 
 foreach(folder toolkit gobs datasources operations krv plugins/support)
   install(DIRECTORY ${CMAKE_SOURCE_DIR}/${folder}/ DESTINATION include/krv/${folder}
-          FILES_MATCHING PATTERN "*.h" PATTERN detail EXCLUDE)
+          FILES_MATCHING PATTERN "*.h" PATTERN detail EXCLUDE PATTERN vectors.h EXCLUDE)
 endforeach()
 
 configure_package_config_file(${CMAKE_CURRENT_LIST_DIR}/krvdatasourcesConfig.cmake.in

@@ -6,7 +6,7 @@
 set -euo pipefail
 cd "${1:-$(dirname "${BASH_SOURCE[0]}")/../..}"
 
-mapfile -d '' oHeaders < <(find toolkit gobs datasources operations krv plugins/support -name '*.h' -not -path '*/detail/*' -print0)
+mapfile -d '' oHeaders < <(find toolkit gobs datasources operations krv plugins/support -name '*.h' -not -path '*/detail/*' -not -name vectors.h -print0)
 awk '
 /^[[:space:]]*$/ { next }
 /^[[:space:]]*\/\// { ++comments[FILENAME]; next }
