@@ -28,6 +28,7 @@
 #include "datasources/interfaces/isidecardataset.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/interfaces/iverifieddataset.h"
+#include "datasources/interfaces/iwatchedstoring.h"
 #include "toolkit/core/numbertext.h"
 
 namespace krv::datasources
@@ -64,6 +65,7 @@ ISidecarDataset::~ISidecarDataset() = default;
 ISidecarWriting::~ISidecarWriting() = default;
 IStorageDataset::~IStorageDataset() = default;
 IVerifiedDataset::~IVerifiedDataset() = default;
+IWatchedStoring::~IWatchedStoring() = default;
 
 unsigned int FindValidityMask(const IBitmapDataset& oBitmaps)
 {

@@ -24,6 +24,7 @@
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/interfaces/iverifieddataset.h"
+#include "datasources/interfaces/iwatchedstoring.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/reader/irasteriterable.h"
@@ -127,6 +128,7 @@ std::vector<Table> Tables()
           Slot(&LU::CreateLUT), Slot(&LU::UpdateLUT), Slot(&LU::SetLUTDescription), Slot(&LU::DeleteLUT)}},
         {"IVerifiedDataset", {Slot(&IVerifiedDataset::Verify)}},
         {"INewFileDataset", {Slot(&INewFileDataset::KeepExisting)}},
+        {"IWatchedStoring", {Slot(&IWatchedStoring::WatchStoring)}},
         {"IStorageDataset", {Slot(&IStorageDataset::GetUnusedBytes)}},
         {"ILayoutDataset", {Slot(&ILayoutDataset::GetVariant), Slot(&ILayoutDataset::CheckCloudLayout)}},
         {"IPlaceRemoval", {Slot(&IPlaceRemoval::RemoveCRS), Slot(&IPlaceRemoval::RemoveGeocoding)}},
