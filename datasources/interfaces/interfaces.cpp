@@ -14,6 +14,7 @@
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
 #include "datasources/interfaces/ilayoutdataset.h"
+#include "datasources/interfaces/ilevelstates.h"
 #include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/ilutdataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
@@ -50,6 +51,7 @@ IFormatOptions::~IFormatOptions() = default;
 IGeocodedDataset::~IGeocodedDataset() = default;
 IHistoryIO::~IHistoryIO() = default;
 ILayoutDataset::~ILayoutDataset() = default;
+ILevelStates::~ILevelStates() = default;
 ILinkedDataset::~ILinkedDataset() = default;
 ILUTDataset::~ILUTDataset() = default;
 IMathModelDataset::~IMathModelDataset() = default;
@@ -66,6 +68,15 @@ ISidecarWriting::~ISidecarWriting() = default;
 IStorageDataset::~IStorageDataset() = default;
 IVerifiedDataset::~IVerifiedDataset() = default;
 IWatchedStoring::~IWatchedStoring() = default;
+
+void SetChannelsValid(IOverviewManager& oManager, const std::vector<unsigned int>& oChannels, unsigned int nLevel,
+                      bool bValid)
+{
+    if (auto* const poStates = dynamic_cast<ILevelStates*>(&oManager))
+        return poStates->SetChannelsValid(oChannels, nLevel, bValid);
+    for (const unsigned int nChannel : oChannels)
+        oManager.SetValid(nChannel, nLevel, bValid);
+}
 
 unsigned int FindValidityMask(const IBitmapDataset& oBitmaps)
 {

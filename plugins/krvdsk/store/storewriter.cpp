@@ -499,6 +499,7 @@ void StoreWriter::Compact()
 void StoreWriter::Finish()
 {
     Synchronize();
+    SetWatch({}); // what was written is the file's
     if (HasFile())
         Compact();
     End();

@@ -20,6 +20,8 @@ namespace
 // A file up to this size costs little to be written twice.
 constexpr std::uint64_t SMALL_FILE = std::uint64_t{4} << 20;
 constexpr std::size_t COPIED_PIECES = 4096;
+// The disk writes so many while the next ones are copied.
+constexpr std::uint64_t COPIED_BYTES = std::uint64_t{32} << 20;
 
 // A page with the places that it gets.
 struct Placed
@@ -149,13 +151,17 @@ void CopyBlocks(std::span<Placed> oPages, const support::File& oSource, support:
     for (std::size_t nAt = 0; nAt < nBlocks; ++nAt)
     {
         PlaceBlocks(oPages, nAt, bEnclosed, oSpace, oPieces);
-        if (oPieces.size() < COPIED_PIECES && nAt + 1 < nBlocks)
+        const std::uint64_t nWaiting =
+            oPieces.empty() ? 0 : oPieces.back().mnTo + oPieces.back().mnBytes - oPieces.front().mnTo;
+        if (oPieces.size() < COPIED_PIECES && nWaiting < COPIED_BYTES && nAt + 1 < nBlocks)
             continue;
+        const std::uint64_t nFrom = oTarget.GetSize();
         support::CopyPieces(oSource, oTarget, oPieces, oScratch, oCopied);
         for (const support::CopiedPiece& oPiece : oPieces)
             if (bEnclosed)
                 Enclose(oPiece, oTarget);
         oPieces.clear();
+        oTarget.BeginFlush(nFrom, oTarget.GetSize() - nFrom);
     }
 }
 

@@ -11,6 +11,7 @@
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
 #include "datasources/interfaces/ilayoutdataset.h"
+#include "datasources/interfaces/ilevelstates.h"
 #include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/ilutdataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
@@ -128,6 +129,7 @@ std::vector<Table> Tables()
           Slot(&LU::CreateLUT), Slot(&LU::UpdateLUT), Slot(&LU::SetLUTDescription), Slot(&LU::DeleteLUT)}},
         {"IVerifiedDataset", {Slot(&IVerifiedDataset::Verify)}},
         {"INewFileDataset", {Slot(&INewFileDataset::KeepExisting)}},
+        {"ILevelStates", {Slot(&ILevelStates::SetChannelsValid)}},
         {"IWatchedStoring", {Slot(&IWatchedStoring::WatchStoring)}},
         {"IStorageDataset", {Slot(&IStorageDataset::GetUnusedBytes)}},
         {"ILayoutDataset", {Slot(&ILayoutDataset::GetVariant), Slot(&ILayoutDataset::CheckCloudLayout)}},
