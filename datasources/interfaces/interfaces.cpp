@@ -14,6 +14,7 @@
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
 #include "datasources/interfaces/ilayoutdataset.h"
+#include "datasources/interfaces/ilevelstates.h"
 #include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/ilutdataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
@@ -28,6 +29,7 @@
 #include "datasources/interfaces/isidecardataset.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/interfaces/iverifieddataset.h"
+#include "datasources/interfaces/iwatchedstoring.h"
 #include "toolkit/core/numbertext.h"
 
 namespace krv::datasources
@@ -49,6 +51,7 @@ IFormatOptions::~IFormatOptions() = default;
 IGeocodedDataset::~IGeocodedDataset() = default;
 IHistoryIO::~IHistoryIO() = default;
 ILayoutDataset::~ILayoutDataset() = default;
+ILevelStates::~ILevelStates() = default;
 ILinkedDataset::~ILinkedDataset() = default;
 ILUTDataset::~ILUTDataset() = default;
 IMathModelDataset::~IMathModelDataset() = default;
@@ -64,6 +67,16 @@ ISidecarDataset::~ISidecarDataset() = default;
 ISidecarWriting::~ISidecarWriting() = default;
 IStorageDataset::~IStorageDataset() = default;
 IVerifiedDataset::~IVerifiedDataset() = default;
+IWatchedStoring::~IWatchedStoring() = default;
+
+void SetChannelsValid(IOverviewManager& oManager, const std::vector<unsigned int>& oChannels, unsigned int nLevel,
+                      bool bValid)
+{
+    if (auto* const poStates = dynamic_cast<ILevelStates*>(&oManager))
+        return poStates->SetChannelsValid(oChannels, nLevel, bValid);
+    for (const unsigned int nChannel : oChannels)
+        oManager.SetValid(nChannel, nLevel, bValid);
+}
 
 unsigned int FindValidityMask(const IBitmapDataset& oBitmaps)
 {

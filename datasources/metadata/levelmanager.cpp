@@ -135,12 +135,25 @@ void LevelManager::DeleteLevel(unsigned int nLevel)
 
 void LevelManager::SetValid(unsigned int nChannel, unsigned int nLevel, bool bValid)
 {
-    const Place oPlace = Place::Current();
+    StoreStates({nChannel}, nLevel, bValid, Place::Current());
+}
+
+void LevelManager::SetChannelsValid(const std::vector<unsigned int>& oChannels, unsigned int nLevel, bool bValid)
+{
+    StoreStates(oChannels, nLevel, bValid, Place::Current());
+}
+
+void LevelManager::StoreStates(const std::vector<unsigned int>& oChannels, unsigned int nLevel, bool bValid,
+                               const Place& oPlace)
+{
     Get(nLevel, oPlace);
-    const unsigned int nFound = GetChannel(nChannel, oPlace);
+    std::vector<unsigned int> oFound;
+    for (const unsigned int nChannel : oChannels)
+        oFound.push_back(GetChannel(nChannel, oPlace));
     CheckWriting("overviews cannot be written", oPlace);
     AuxiliaryData oBook = moLevels.GetBook();
-    SetLevelValid(oBook, nFound, nLevel, bValid, moLevels.GetMethod());
+    for (const unsigned int nChannel : oFound)
+        SetLevelValid(oBook, nChannel, nLevel, bValid, moLevels.GetMethod());
     moLevels.WriteBook(oBook, bValid, oPlace);
 }
 

@@ -1,5 +1,6 @@
 #pragma once
 
+#include "datasources/interfaces/ilevelstates.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "toolkit/exceptions/place.h"
@@ -55,7 +56,7 @@ private:
 // The overview manager over them: what is refused, how large a level is and what the book says of it. A derived class
 // says of whose image the levels are and how their pixels are reached.
 // The operations are IOverviewManager's, with errors in one wording for all formats.
-class KRV_DATASOURCES_API LevelManager : public IOverviewManager
+class KRV_DATASOURCES_API LevelManager : public IOverviewManager, public ILevelStates
 {
 public:
     // The store outlives it.
@@ -69,6 +70,7 @@ public:
     void DeleteLevel(unsigned int nLevel) override;
     std::string GetResamplingName() const override;
     void SetValid(unsigned int nChannel, unsigned int nLevel, bool bValid) override;
+    void SetChannelsValid(const std::vector<unsigned int>& oChannels, unsigned int nLevel, bool bValid) override;
     unsigned int GetLevelWidth(unsigned int nLevel) const override;
     unsigned int GetLevelHeight(unsigned int nLevel) const override;
     AuxiliaryData GetAuxiliaryData(unsigned int nLevel) override;
@@ -86,6 +88,7 @@ private:
     // A new I/O object over a level that there is. oChannels: as FindChannel gave them.
     virtual IRasterIO* OpenLevelIO(unsigned int nLevel, const std::vector<unsigned int>& oChannels) = 0;
 
+    void StoreStates(const std::vector<unsigned int>& oChannels, unsigned int nLevel, bool bValid, const Place& oPlace);
     bool Has(unsigned int nLevel) const;
     LevelStore::Level Get(unsigned int nLevel, const Place& oPlace) const;
     unsigned int GetChannel(unsigned int nChannel, const Place& oPlace) const;

@@ -1,5 +1,6 @@
 #include "datasources/writer/basicoverviewwriteraccessor.h"
 
+#include "datasources/interfaces/ilevelstates.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/irasterio.h"
@@ -84,9 +85,7 @@ void BasicOverviewWriterAccessor::SetValid(unsigned int nChannel, unsigned int n
 
 void BasicOverviewWriterAccessor::SetLevelValid(unsigned int nLevel, bool bValid)
 {
-    IOverviewManager& oManager = Manager(Place::Current());
-    for (const unsigned int nChannel : moChannels)
-        oManager.SetValid(nChannel, nLevel, bValid);
+    SetChannelsValid(Manager(Place::Current()), moChannels, nLevel, bValid);
 }
 
 void BasicOverviewWriterAccessor::SetResamplingName(const std::string& oName)

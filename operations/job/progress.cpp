@@ -1,5 +1,7 @@
 #include "operations/job/progress.h"
 
+#include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/iwatchedstoring.h"
 #include "operations/job/exceptions.h"
 
 #include <utility>
@@ -11,6 +13,16 @@ void Report(const Progress& oProgress, const Amount& oAmount)
 {
     if (oProgress && !oProgress(oAmount))
         throw StoppedException();
+}
+
+void WatchStoring(krv::datasources::IDataset& oDataset, const Progress& oProgress)
+{
+    auto* const poWatched = dynamic_cast<krv::datasources::IWatchedStoring*>(&oDataset);
+    if (poWatched != nullptr && oProgress)
+        poWatched->WatchStoring(
+            [oProgress](std::uint64_t nDone, std::uint64_t nTotal) {
+                Report(oProgress, {"store", nDone, nTotal});
+            });
 }
 
 ProgressCounter::ProgressCounter(Progress oProgress, const char* pPart, std::uint64_t nTotal)

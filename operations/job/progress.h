@@ -5,6 +5,11 @@
 #include <cstdint>
 #include <functional>
 
+namespace krv::datasources
+{
+class IDataset;
+}
+
 namespace krv::operations
 {
 
@@ -18,16 +23,17 @@ struct Amount
 };
 
 // Called when a part begins, between pieces of work and while the job waits for its threads, by the thread that called
-// it. False stops the job, which
-// throws StoppedException then and leaves files as if it had failed. May throw. An empty function: nobody asks.
-// Example: [](const Amount& oAmount) { return !bStop; }
+// it. False stops the job, which throws StoppedException then and leaves files as if it had failed. May throw. An empty
+// function: nobody asks. Example: [](const Amount& oAmount) { return !bStop; }
 using Progress = std::function<bool(const Amount&)>;
 
 // For those who write jobs: says how far it is. Throws StoppedException when the function says to stop.
 KRV_OPERATIONS_API void Report(const Progress& oProgress, const Amount& oAmount);
 
-// The same, counting one part.
-// Of one thread, the one that called the job.
+// Has a dataset tell so, as the part "store", while it brings to the disk what was written.
+KRV_OPERATIONS_API void WatchStoring(krv::datasources::IDataset& oDataset, const Progress& oProgress);
+
+// Reports, counting one part. Of one thread, the one that called the job.
 class KRV_OPERATIONS_API ProgressCounter
 {
 public:

@@ -369,9 +369,10 @@ MaskResult MakeMask(const SourceFile& oFile, const MaskRequest& oRequest, const 
         });
     oResult.pixels = std::uint64_t{nWidth} * nHeight;
     if (oPicture)
-        WritePng(oPicture->Finish(), oRequest.picture);
+        WritePng(oPicture->Finish(), oRequest.picture, oProgress);
     if (oTarget)
     {
+        WatchStoring(oFile.GetDataset(), oProgress);
         oTarget->Finish();
         oResult.bitmap = oTarget->GetBitmap();
         oResult.complement = oTarget->IsComplement();

@@ -96,27 +96,42 @@ struct PngWriteStruct
     ~PngWriteStruct() { png_destroy_write_struct(&mpPng, &mpInfo); }
 };
 
+// The picture on its way into a file.
+struct Writing
+{
+    const Picture& picture;
+    std::FILE* file;
+    const Progress& progress;
+
+    std::size_t GetPitch() const { return static_cast<std::size_t>(picture.width) * picture.samples; }
+    const std::uint8_t* GetRow(unsigned int y) const
+    {
+        Report(progress, {"picture", y * GetPitch(), picture.height * GetPitch()});
+        return picture.pixels.data() + y * GetPitch();
+    }
+};
+
 // False when libpng gave up, which it does by a long jump: nothing with a destructor lives in this frame.
-bool WriteRows(const PngWriteStruct& oPng, const Picture& oPicture, std::FILE* pFile)
+bool WriteRows(const PngWriteStruct& oPng, const Writing& oWriting)
 {
     if (setjmp(png_jmpbuf(oPng.mpPng)) != 0)
         return false;
-    png_init_io(oPng.mpPng, pFile);
+    const Picture& oPicture = oWriting.picture;
+    png_init_io(oPng.mpPng, oWriting.file);
     png_set_IHDR(oPng.mpPng, oPng.mpInfo, oPicture.width, oPicture.height, 8, COLOUR_TYPES[oPicture.samples - 1],
                  PNG_INTERLACE_NONE, PNG_COMPRESSION_TYPE_DEFAULT, PNG_FILTER_TYPE_DEFAULT);
     png_set_compression_level(oPng.mpPng, 4);
     png_write_info(oPng.mpPng, oPng.mpInfo);
-    const std::size_t nPitch = static_cast<std::size_t>(oPicture.width) * oPicture.samples;
     for (unsigned int y = 0; y < oPicture.height; ++y)
-        png_write_row(oPng.mpPng, oPicture.pixels.data() + y * nPitch);
+        png_write_row(oPng.mpPng, oWriting.GetRow(y));
     png_write_end(oPng.mpPng, oPng.mpInfo);
     return true;
 }
 
-bool WritePngRows(const Picture& oPicture, std::FILE* pFile)
+bool WritePngRows(const Writing& oWriting)
 {
     const PngWriteStruct oPng;
-    return oPng.mpInfo != nullptr && WriteRows(oPng, oPicture, pFile);
+    return oPng.mpInfo != nullptr && WriteRows(oPng, oWriting);
 }
 
 struct JpegStruct
@@ -155,13 +170,14 @@ void Flatten(const std::uint8_t* pRow, const Picture& oPicture, std::vector<std:
 }
 
 // False when libjpeg gave up by a long jump; what has a destructor lives with the caller.
-bool WriteJpegRows(JpegStruct& oJpeg, std::vector<std::uint8_t>& oRow, const Picture& oPicture, std::FILE* pFile)
+bool WriteJpegRows(JpegStruct& oJpeg, std::vector<std::uint8_t>& oRow, const Writing& oWriting)
 {
     constexpr int QUALITY = 90;
+    const Picture& oPicture = oWriting.picture;
     if (setjmp(oJpeg.moJump) != 0)
         return false;
     jpeg_create_compress(&oJpeg.moJpeg);
-    jpeg_stdio_dest(&oJpeg.moJpeg, pFile);
+    jpeg_stdio_dest(&oJpeg.moJpeg, oWriting.file);
     oJpeg.moJpeg.image_width = oPicture.width;
     oJpeg.moJpeg.image_height = oPicture.height;
     oJpeg.moJpeg.input_components = oPicture.samples < 3 ? 1 : 3;
@@ -171,7 +187,7 @@ bool WriteJpegRows(JpegStruct& oJpeg, std::vector<std::uint8_t>& oRow, const Pic
     jpeg_start_compress(&oJpeg.moJpeg, TRUE);
     for (unsigned int y = 0; y < oPicture.height; ++y)
     {
-        Flatten(oPicture.pixels.data() + std::size_t{y} * oPicture.width * oPicture.samples, oPicture, oRow);
+        Flatten(oWriting.GetRow(y), oPicture, oRow);
         JSAMPROW pRow = oRow.data();
         jpeg_write_scanlines(&oJpeg.moJpeg, &pRow, 1);
     }
@@ -179,14 +195,14 @@ bool WriteJpegRows(JpegStruct& oJpeg, std::vector<std::uint8_t>& oRow, const Pic
     return true;
 }
 
-bool WriteJpeg(const Picture& oPicture, std::FILE* pFile)
+bool WriteJpeg(const Writing& oWriting)
 {
     JpegStruct oJpeg;
-    std::vector<std::uint8_t> oRow(std::size_t{oPicture.width} * 3);
-    return WriteJpegRows(oJpeg, oRow, oPicture, pFile);
+    std::vector<std::uint8_t> oRow(std::size_t{oWriting.picture.width} * 3);
+    return WriteJpegRows(oJpeg, oRow, oWriting);
 }
 
-using RowWriter = bool (*)(const Picture&, std::FILE*);
+using RowWriter = bool (*)(const Writing&);
 
 // What writes files of that name; null for names that say nothing known.
 RowWriter KindOf(const std::string& fileName)
@@ -197,18 +213,18 @@ RowWriter KindOf(const std::string& fileName)
     return extension == ".JPG" || extension == ".JPEG" ? &WriteJpeg : nullptr;
 }
 
-void WriteBy(const Picture& oPicture, const std::string& name, std::FILE* pFile, RowWriter pRows)
+void WriteBy(RowWriter pRows, const Writing& oWriting, const std::string& name)
 {
-    if (!pRows(oPicture, pFile))
+    if (!pRows(oWriting))
         throw krv::IOException(name, std::string("it cannot be written: ") + std::strerror(errno));
 }
 
 } // namespace
 
-void WritePng(const Picture& oPicture, const std::string& fileName)
+void WritePng(const Picture& oPicture, const std::string& fileName, const Progress& oProgress)
 {
     NewFile oFile(fileName);
-    WriteBy(oPicture, fileName, oFile.Get(), &WritePngRows);
+    WriteBy(&WritePngRows, {oPicture, oFile.Get(), oProgress}, fileName);
     oFile.PutInPlace();
 }
 
@@ -217,11 +233,11 @@ bool IsPictureName(const std::string& fileName)
     return fileName == "-" || KindOf(fileName) != nullptr;
 }
 
-void WritePicture(const Picture& oPicture, const std::string& fileName)
+void WritePicture(const Picture& oPicture, const std::string& fileName, const Progress& oProgress)
 {
     if (fileName == "-")
     {
-        WriteBy(oPicture, "the standard output", stdout, &WritePngRows);
+        WriteBy(&WritePngRows, {oPicture, stdout, oProgress}, "the standard output");
         if (std::fflush(stdout) != 0)
             throw krv::IOException("the standard output", std::string("it cannot be written: ") + std::strerror(errno));
         return;
@@ -230,7 +246,7 @@ void WritePicture(const Picture& oPicture, const std::string& fileName)
     if (pRows == nullptr)
         throw RequestException(fileName + ": pictures are written as .png or .jpg");
     NewFile oFile(fileName);
-    WriteBy(oPicture, fileName, oFile.Get(), pRows);
+    WriteBy(pRows, {oPicture, oFile.Get(), oProgress}, fileName);
     oFile.PutInPlace();
 }
 

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "operations/api.h"
+#include "operations/job/progress.h"
 
 #include <cstdint>
 #include <string>
@@ -21,8 +22,8 @@ struct Picture
 };
 
 // Writes the picture as PNG, replacing an existing file only when all is written. Throws krv::IOException naming the
-// file and the cause; nothing is left behind then.
-KRV_OPERATIONS_API void WritePng(const Picture& oPicture, const std::string& fileName);
+// file and the cause; nothing is left behind then. oProgress: told of each row, as the part "picture".
+KRV_OPERATIONS_API void WritePng(const Picture& oPicture, const std::string& fileName, const Progress& oProgress = {});
 
 // Whether WritePicture writes files of that name: ".png", ".jpg" and ".jpeg" in any letter case, and "-".
 KRV_OPERATIONS_API bool IsPictureName(const std::string& fileName);
@@ -30,6 +31,7 @@ KRV_OPERATIONS_API bool IsPictureName(const std::string& fileName);
 // The same in the form that the name says; "-" is PNG on the standard output. JPEG has no transparency: such pixels are
 // white. Throws RequestException for another name.
 // Nobody sees half a file: an existing one is replaced when all is written.
-KRV_OPERATIONS_API void WritePicture(const Picture& oPicture, const std::string& fileName);
+KRV_OPERATIONS_API void WritePicture(const Picture& oPicture, const std::string& fileName,
+                                     const Progress& oProgress = {});
 
 } // namespace krv::operations

@@ -352,6 +352,12 @@ QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOption
     const Resampling eMethod = oOptions.average ? Resampling::eAverage : Resampling::eNearest;
     std::vector<Plane> oPlanes = oLook.power ? ReadPower(oFile, oOptions.channels, oSize, oThreads)
                                              : ReadPlanes(oFile, oChoice.channels, oSize, eMethod, oThreads);
+    // Between steps in memory, each of which is long for a large picture.
+    const auto Ask = [&]
+    {
+        Report(oProgress, {"picture", 0, std::uint64_t{oSize.width} * oSize.height * 4});
+    };
+    Ask();
     if (oLook.decibels)
         TakeDecibels(oPlanes);
     const std::vector<float> oOpacity = FindOpacity(oFile, oChoice, oSize, oPlanes, oThreads);
@@ -362,12 +368,18 @@ QuickLook MakeQuickLook(const SourceFile& oFile, const QuickLookOptions& oOption
 
     oLook.picture.samples = oPlanes.size() == 3 ? 4U : 2U;
     oLook.picture.pixels.resize(std::size_t{oSize.width} * oSize.height * oLook.picture.samples);
+    Ask();
     const std::vector<Plane> oCounted = WithoutCollar(oPlanes);
     for (std::size_t c = 0; c < oPlanes.size(); ++c)
+    {
+        Ask();
         oLook.stretches.push_back(FindStretch(oCounted[c], bInks ? StretchMode::eNone : oOptions.stretch,
                                               !oLook.power && oFile.GetType(oChoice.channels[c]) == krv::gobs::eDT_8U,
                                               oChoice.reason == DisplayReason::eRoles));
+    }
+    Ask();
     PaintStretched(oLook.picture, oPlanes, oLook.stretches, oChoice.inverted);
+    Ask();
     PaintOpacity(oLook.picture, oOpacity);
     DropOpaqueAlpha(oLook.picture);
     if (oOptions.legend)

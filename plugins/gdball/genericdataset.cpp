@@ -1,5 +1,6 @@
 #include "plugins/gdball/genericdataset.h"
 
+#include "datasources/interfaces/ilevelstates.h"
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "gobs/pct/pct.h"
@@ -86,7 +87,7 @@ private:
 };
 
 // The levels as a manager, which keeps what it stands on.
-class GenericLevels : public IOverviewManager
+class GenericLevels : public IOverviewManager, public ILevelStates
 {
 public:
     explicit GenericLevels(std::shared_ptr<SharedImage> poImage) : mpoImage(std::move(poImage)) {}
@@ -103,7 +104,11 @@ public:
     std::string GetResamplingName() const override { return Get().GetMethod(); }
     void SetValid(unsigned int nChannel, unsigned int nLevel, bool bValid) override
     {
-        Get().SetValid(nChannel, nLevel, bValid);
+        Get().SetValid({nChannel}, nLevel, bValid);
+    }
+    void SetChannelsValid(const std::vector<unsigned int>& oChannels, unsigned int nLevel, bool bValid) override
+    {
+        Get().SetValid(oChannels, nLevel, bValid);
     }
     unsigned int GetLevelWidth(unsigned int nLevel) const override { return Get().GetSize(nLevel).first; }
     unsigned int GetLevelHeight(unsigned int nLevel) const override { return Get().GetSize(nLevel).second; }

@@ -1,6 +1,7 @@
 #include "plugins/gdball/levelsbeside.h"
 
 #include "datasources/interfaces/ichannelinfo.h"
+#include "datasources/interfaces/ilevelstates.h"
 #include "datasources/interfaces/ioverviewio.h"
 #include "datasources/iomanager/datasetmanager.h"
 #include "datasources/metadata/auxiliarydata.h"
@@ -252,14 +253,15 @@ bool LevelsBeside::IsValid(unsigned int nChannel, unsigned int nLevel) const
     return IsLevelValid(mpoFile->ReadAuxiliaryData(), nChannel, FIRST_LEVEL_PAGE);
 }
 
-void LevelsBeside::SetValid(unsigned int nChannel, unsigned int nLevel, bool bValid)
+void LevelsBeside::SetValid(const std::vector<unsigned int>& oChannels, unsigned int nLevel, bool bValid)
 {
     const unsigned int nOwn = FindOwn(nLevel, Place::Current());
     mbForgotten = mbForgotten && !bValid;
     if (nOwn != FIRST_LEVEL_PAGE)
-        return GetOwn().SetValid(nChannel, nOwn, bValid);
+        return SetChannelsValid(GetOwn(), oChannels, nOwn, bValid);
     AuxiliaryData oBook = mpoFile->ReadAuxiliaryData();
-    SetLevelValid(oBook, nChannel, FIRST_LEVEL_PAGE, bValid, moMethod);
+    for (const unsigned int nChannel : oChannels)
+        SetLevelValid(oBook, nChannel, FIRST_LEVEL_PAGE, bValid, moMethod);
     mpoFile->WriteAuxiliaryData(oBook);
 }
 

@@ -34,7 +34,7 @@ public:
     // The largest goes with all others alone.
     void DropLevel(unsigned int nLevel);
     bool IsValid(unsigned int nChannel, unsigned int nLevel) const;
-    void SetValid(unsigned int nChannel, unsigned int nLevel, bool bValid);
+    void SetValid(const std::vector<unsigned int>& oChannels, unsigned int nLevel, bool bValid);
     // All of them, when pixels of the image changed.
     void ForgetLevels();
     std::pair<unsigned int, unsigned int> GetSize(unsigned int nLevel) const;

@@ -59,7 +59,7 @@ std::unique_ptr<support::NewFile> RawWriter::MakeHeader() const
 void RawWriter::Store()
 {
     if (mbPixels)
-        GetFile()->Flush();
+        GetFile()->Flush(GetWatch());
     mbPixels = false;
     if (!mbHeader || !IsNamed())
         return;

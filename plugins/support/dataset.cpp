@@ -103,6 +103,12 @@ void Dataset::KeepExisting()
         mpoWriter->KeepExisting();
 }
 
+void Dataset::WatchStoring(Watch oWatch)
+{
+    if (mpoWriter)
+        mpoWriter->SetWatch(std::move(oWatch));
+}
+
 void Dataset::CheckOpen(const Place& oPlace) const
 {
     if (!mbOpen)

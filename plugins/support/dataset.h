@@ -4,6 +4,7 @@
 #include "datasources/interfaces/inewfiledataset.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/interfaces/isidecardataset.h"
+#include "datasources/interfaces/iwatchedstoring.h"
 #include "plugins/support/image/blockcache.h"
 #include "plugins/support/image/blockimage.h"
 #include "plugins/support/image/iblocksource.h"
@@ -29,6 +30,7 @@ namespace krv::plugins::support
 class Dataset : public krv::datasources::IDataset,
                 public krv::datasources::IRasterDataset,
                 public krv::datasources::INewFileDataset,
+                public krv::datasources::IWatchedStoring,
                 public krv::datasources::ISidecarDataset,
                 public krv::datasources::ISidecarWriting
 {
@@ -90,6 +92,7 @@ public:
     krv::datasources::AccessCapabilities GetRasterCapabilities() override;
 
     void KeepExisting() override;
+    void WatchStoring(Watch oWatch) override;
 
     // Nothing before there is an image.
     // What a format asks of them is said by GetNeeds.

@@ -1,13 +1,20 @@
 // Jobs give the same with any number of threads, over real files when the folder with them is there.
+#include "datasources/utils/open.h"
+#include "datasources/writer/irasterwriter.h"
+#include "gobs/raster/raster.h"
 #include "operations/checksum/checksums.h"
+#include "operations/copy/conversion.h"
+#include "operations/job/exceptions.h"
 #include "operations/picture/quicklook.h"
 #include "operations/statistics/statistics.h"
 #include "tests/support/facts.h"
 #include "toolkit/nspio/warning.h"
 #include "toolkit/threading/threadpool.h"
+#include "tools/conformance/tempfolder.h"
 
 #include <gtest/gtest.h>
 
+#include <filesystem>
 #include <sstream>
 
 namespace krv::operations
@@ -71,7 +78,53 @@ std::string SayAll(const std::string& file, IExecutor* poExecutor)
     return oText.str();
 }
 
+// Says stop in the middle of a part, and notes that it was there.
+Progress StopWithin(const std::string& part, bool& bReached)
+{
+    return [part, &bReached](const Amount& oAmount)
+    {
+        bReached = bReached || (oAmount.part == part && oAmount.done > 0 && oAmount.done < oAmount.total);
+        return !bReached;
+    };
+}
+
 } // namespace
+
+// What comes after the last tile can take as long as all before it.
+TEST(JobThreads, WhatIsDoneIsStoppedOnItsWayToTheDisk)
+{
+    const krv::conformance::TempFolder oFolder;
+    const std::string source = oFolder.File("source.tif");
+    {
+        krv::gobs::Raster oPixels({3200, 3200, 1, krv::gobs::eDT_8U}, {0, 0, 0, 0});
+        for (std::uint64_t i = 0; i < oPixels.GetBufferSize(); ++i)
+            oPixels.GetBuffer()[i] = static_cast<unsigned char>(i % 251 + 1);
+        const auto poWriter = krv::CreateWriter(source, oPixels.GetInfo());
+        poWriter->WriteRaster(&oPixels);
+        poWriter->Synchronize();
+    }
+    const auto CountFiles = [&oFolder]
+    {
+        return std::distance(std::filesystem::directory_iterator(oFolder.GetPath()), {});
+    };
+    for (const auto& [name, options] :
+         {std::pair("a.tif", "BLOCKXSIZE=512 BLOCKYSIZE=512"), {"b.tif", "LAYOUT=COG"}, {"c.krv", ""}, {"d.bsq", ""}})
+    {
+        bool bReached = false;
+        EXPECT_THROW(Convert({{source}, {}, {}, {}}, {oFolder.File(name), "", options}, StopWithin("store", bReached)),
+                     StoppedException)
+            << name;
+        EXPECT_TRUE(bReached && CountFiles() == 1) << name;
+    }
+    Picture oPicture{3000, 20, 3, {}};
+    oPicture.pixels.resize(std::size_t{3000} * 20 * 3);
+    for (const char* const pName : {"e.png", "f.jpg"})
+    {
+        bool bReached = false;
+        EXPECT_THROW(WritePicture(oPicture, oFolder.File(pName), StopWithin("picture", bReached)), StoppedException);
+        EXPECT_TRUE(bReached && CountFiles() == 1) << pName;
+    }
+}
 
 TEST(JobThreads, RealFilesGiveTheSame)
 {

@@ -3,6 +3,7 @@
 #include "datasources/interfaces/ibitmapdataset.h"
 #include "datasources/interfaces/iblocktransfer.h"
 #include "datasources/interfaces/ifileformat.h"
+#include "datasources/interfaces/ilevelstates.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/ipctdataset.h"
 #include "datasources/interfaces/irasterio.h"
@@ -195,8 +196,7 @@ public:
         if (!method.empty())
             moTarget.Try(fmt::format("the method {} of level {}", method, nLevel),
                          [&] { moTo.SetResamplingName(method); });
-        for (const unsigned int nChannel : moChannels)
-            moTo.SetValid(nChannel, nLevel, true);
+        SetChannelsValid(moTo, moChannels, nLevel, true);
         return true;
     }
 

@@ -113,6 +113,7 @@ void Target::Make(const std::string& options)
     if (mpoRaster == nullptr)
         throw krv::DataException(moName + ": the format does not hold images");
     mpoRaster->Create(moLayout.width, moLayout.height, moLayout.types);
+    WatchStoring(*mpoDataset, moProgress);
 }
 
 bool Target::TryMake(const std::string& options)

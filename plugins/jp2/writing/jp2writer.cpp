@@ -195,7 +195,7 @@ void Jp2Writer::WriteAll(support::File& oFile) const
         nPlace += oData.back().mnBytes;
     }
     support::Scratch oScratch;
-    support::CopyPieces(*GetFile(), oFile, oData, oScratch);
+    support::CopyPieces(*GetFile(), oFile, oData, oScratch, WatchPart(nPlace));
     // Each was encoded as the first one of a codestream of its own.
     for (std::size_t nTile = 1; nTile < oData.size(); ++nTile)
     {

@@ -392,7 +392,7 @@ void StoreWriter::Commit()
     oRoot.mnGeneration = mnNextGeneration;
     oRoot.mnFileBytes = std::min(mpoSpace->FindUsedEnd(), GetFile()->GetSize());
     oRoot.moDirectory = moDirectory;
-    GetFile()->Flush();
+    GetFile()->Flush(GetWatch());
     Publish(oRoot);
     // Nobody reads what has no name yet.
     mpoSpace->Reuse(IsNamed() ? GetFile()->FindHeld() : support::Space::Roots(std::in_place));
@@ -499,6 +499,7 @@ void StoreWriter::Compact()
 void StoreWriter::Finish()
 {
     Synchronize();
+    SetWatch({}); // what was written is the file's
     if (HasFile())
         Compact();
     End();

@@ -74,7 +74,8 @@ void CopyTogether(const File& oFrom, File& oTo, const CopiedPiece* pPieces, std:
 
 } // namespace
 
-void CopyPieces(const File& oFrom, File& oTo, std::vector<CopiedPiece> oPieces, Scratch& oScratch)
+void CopyPieces(const File& oFrom, File& oTo, std::vector<CopiedPiece> oPieces, Scratch& oScratch,
+                const Copied& oCopied)
 {
     unsigned char* const pBuffer = oScratch.Get(2 * BUFFER_BYTES);
     Merge(oPieces);
@@ -82,7 +83,11 @@ void CopyPieces(const File& oFrom, File& oTo, std::vector<CopiedPiece> oPieces, 
     {
         const std::size_t nTogether = CountTogether(oPieces, n);
         if (nTogether > 1)
+        {
             CopyTogether(oFrom, oTo, oPieces.data() + n, nTogether, pBuffer);
+            if (oCopied)
+                oCopied(oPieces[n + nTogether - 1].mnTo + oPieces[n + nTogether - 1].mnBytes - oPieces[n].mnTo);
+        }
         const CopiedPiece& oPiece = oPieces[n];
         for (std::uint64_t nDone = 0; nDone < oPiece.mnBytes && nTogether == 1;)
         {
@@ -90,6 +95,8 @@ void CopyPieces(const File& oFrom, File& oTo, std::vector<CopiedPiece> oPieces, 
             oFrom.Read(oPiece.mnFrom + nDone, pBuffer, nBytes);
             oTo.Write(oPiece.mnTo + nDone, pBuffer, nBytes);
             nDone += nBytes;
+            if (oCopied)
+                oCopied(nBytes);
         }
         n += nTogether;
     }

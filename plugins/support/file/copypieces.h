@@ -4,6 +4,7 @@
 #include "plugins/support/file/scratch.h"
 
 #include <cstdint>
+#include <functional>
 #include <vector>
 
 namespace krv::plugins::support
@@ -19,8 +20,11 @@ struct CopiedPiece
 };
 
 // Copies pieces in few and large calls: those that lie side by side in both files go together. In the target a single
-// byte between two pieces is filling, which may be written too. Throws what reading and writing throw.
-// oScratch: working memory, a few mebibytes. The order of the pieces does not matter.
-void CopyPieces(const File& oFrom, File& oTo, std::vector<CopiedPiece> oPieces, Scratch& oScratch);
+// byte between two pieces is filling, which may be written too. oCopied gets the bytes that were copied since the last
+// time; may be empty. oScratch: working memory, a few mebibytes. The order of the pieces does not matter. Throws what
+// reading, writing and oCopied throw.
+using Copied = std::function<void(std::uint64_t nBytes)>;
+void CopyPieces(const File& oFrom, File& oTo, std::vector<CopiedPiece> oPieces, Scratch& oScratch,
+                const Copied& oCopied = {});
 
 } // namespace krv::plugins::support

@@ -311,6 +311,27 @@ void File::Flush(const Place& oPlace)
         throw IOException(moName, moName + ": was removed or replaced while it was being written", oPlace);
 }
 
+// An error that waiting tells would not be told again by the call that makes sure of all.
+void File::Flush(const Watch& oWatch, const Place& oPlace)
+{
+    constexpr std::uint64_t PIECE = std::uint64_t{8} << 20, AHEAD = 8 * PIECE;
+    const bool bPieces = oWatch && mnSize > PIECE;
+    if (bPieces)
+        BeginFlush(0, AHEAD);
+    for (std::uint64_t nDone = 0; bPieces && nDone < mnSize; nDone += PIECE)
+    {
+        oWatch(nDone, mnSize);
+        BeginFlush(nDone + AHEAD, PIECE);
+        if (::sync_file_range(mnDescriptor, static_cast<off_t>(nDone), static_cast<off_t>(PIECE),
+                              SYNC_FILE_RANGE_WAIT_BEFORE | SYNC_FILE_RANGE_WRITE | SYNC_FILE_RANGE_WAIT_AFTER) != 0 &&
+            (errno == EIO || errno == ENOSPC || errno == EDQUOT))
+            throw IOException(moName, moName + ": writing failed: " + SystemErrorText(errno), oPlace);
+    }
+    if (bPieces)
+        oWatch(mnSize, mnSize);
+    Flush(oPlace);
+}
+
 void File::BeginFlush(std::uint64_t nOffset, std::uint64_t nBytes) const noexcept
 {
     ::sync_file_range(mnDescriptor, static_cast<off_t>(nOffset), static_cast<off_t>(nBytes), SYNC_FILE_RANGE_WRITE);

@@ -7,6 +7,7 @@
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <optional>
 #include <source_location>
 #include <string>
@@ -88,6 +89,10 @@ public:
     // find it again.
     // Takes as long as the disk needs, so that formats call it for whole states and not for blocks.
     void Flush(const Place& oPlace = Place::Current());
+    // The same in pieces, after each of which oWatch gets the bytes that are there and all. What it throws passes; then
+    // nothing is certain to be on the disk.
+    using Watch = std::function<void(std::uint64_t nDone, std::uint64_t nTotal)>;
+    void Flush(const Watch& oWatch, const Place& oPlace = Place::Current());
     // Has the system begin with what was written there: Flush has the less to wait for.
     void BeginFlush(std::uint64_t nOffset, std::uint64_t nBytes) const noexcept;
 

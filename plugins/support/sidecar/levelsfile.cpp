@@ -1,12 +1,14 @@
 #include "plugins/support/sidecar/levelsfile.h"
 
 #include "datasources/interfaces/idataset.h"
+#include "datasources/interfaces/ilevelstates.h"
 #include "datasources/interfaces/ioverviewmanager.h"
 #include "datasources/interfaces/irasterdataset.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/metadata/levelbook.h"
 
 #include <memory>
+#include <vector>
 
 namespace krv::plugins::support
 {
@@ -21,9 +23,14 @@ void ForgetLevels(krv::datasources::IDataset& oLevels)
     if (poOwn == nullptr)
         return;
     for (const unsigned int nLevel : poOwn->GetLevels())
+    {
+        std::vector<unsigned int> oValid;
         for (unsigned int nChannel = 1; nChannel <= oRaster.GetChanCount(); ++nChannel)
             if (poOwn->IsValid(nChannel, nLevel))
-                poOwn->SetValid(nChannel, nLevel, false);
+                oValid.push_back(nChannel);
+        if (!oValid.empty())
+            krv::datasources::SetChannelsValid(*poOwn, oValid, nLevel, false);
+    }
 }
 
 } // namespace krv::plugins::support

@@ -45,11 +45,23 @@ void FileWriter::RemoveFile() noexcept
     mpoNew.reset();
 }
 
+std::function<void(std::uint64_t nBytes)> FileWriter::WatchPart(std::uint64_t nTotal) const
+{
+    if (!moWatch)
+        return {};
+    moWatch(0, nTotal);
+    return [this, nTotal, nDone = std::uint64_t{0}](std::uint64_t nBytes) mutable
+    {
+        nDone += nBytes;
+        moWatch(nDone, nTotal);
+    };
+}
+
 void FileWriter::StoreAnew(const std::function<void(File&)>& oWrite)
 {
     NewFile oNew(moFileName, TakesPlace());
     oWrite(*oNew.GetFile());
-    oNew.GetFile()->Flush();
+    oNew.GetFile()->Flush(moWatch);
     TakeName(oNew);
 }
 

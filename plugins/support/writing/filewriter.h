@@ -6,6 +6,7 @@
 #include <functional>
 #include <memory>
 #include <string>
+#include <utility>
 
 namespace krv::plugins::support
 {
@@ -39,6 +40,8 @@ public:
     bool IsEnded() const { return mbEnded; }
     // A new file takes its name only when nobody has it.
     void KeepExisting() { mbReplaces = false; }
+    // Asked while what was written is brought to the disk, as long as that can be undone.
+    void SetWatch(File::Watch oWatch) { moWatch = std::move(oWatch); }
     // Throws DataException when writing has ended.
     void CheckWritable(const Place& oPlace = Place::Current()) const;
     // Whether something would be lost if the writer went now.
@@ -56,6 +59,9 @@ protected:
     virtual void Store() = 0;
     // Whether Store would have anything to do.
     virtual bool HoldsChanges() const = 0;
+    const File::Watch& GetWatch() const { return moWatch; }
+    // Begins a part of what is watched; takes bytes of it that are done. Empty when nobody watches.
+    std::function<void(std::uint64_t nBytes)> WatchPart(std::uint64_t nTotal) const;
     // Gives a new file that is whole its name.
     virtual void GiveName();
     // For a format that makes its file anew each time: oWrite fills a new one, which is flushed and takes the name.
@@ -82,8 +88,9 @@ private:
     std::string moFileName;
     std::shared_ptr<File> mpoFile;   // null before a new one is made
     std::unique_ptr<NewFile> mpoNew; // until it has its name
-    bool mbNamed;                    // the file lies under its own name
-    bool mbReplaces = true;          // an older file of the name gives way
+    File::Watch moWatch;
+    bool mbNamed;           // the file lies under its own name
+    bool mbReplaces = true; // an older file of the name gives way
     bool mbEnded = false;
 };
 

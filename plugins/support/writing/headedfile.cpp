@@ -93,7 +93,7 @@ void HeadedFile::Store()
     if (!mbChanged)
         return;
     GetFile()->Write(moFirstLines.moFinished.size(), moHeader.data(), moHeader.size());
-    GetFile()->Flush();
+    GetFile()->Flush(GetWatch());
     GetFile()->Write(0, moFirstLines.moFinished.data(), moFirstLines.moFinished.size());
     GetFile()->Flush();
     mbMarked = false;

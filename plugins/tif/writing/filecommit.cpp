@@ -20,6 +20,8 @@ namespace
 // A file up to this size costs little to be written twice.
 constexpr std::uint64_t SMALL_FILE = std::uint64_t{4} << 20;
 constexpr std::size_t COPIED_PIECES = 4096;
+// The disk writes so many while the next ones are copied.
+constexpr std::uint64_t COPIED_BYTES = std::uint64_t{32} << 20;
 
 // A page with the places that it gets.
 struct Placed
@@ -142,20 +144,24 @@ void PlaceBlocks(std::span<Placed> oPages, std::size_t nAt, bool bEnclosed, supp
 
 // oPages: an image, or an image and its mask.
 void CopyBlocks(std::span<Placed> oPages, const support::File& oSource, support::Space& oSpace, support::File& oTarget,
-                bool bEnclosed, support::Scratch& oScratch)
+                bool bEnclosed, support::Scratch& oScratch, const support::Copied& oCopied)
 {
     const std::size_t nBlocks = oPages.front().moPage.GetStriles();
     std::vector<support::CopiedPiece> oPieces;
     for (std::size_t nAt = 0; nAt < nBlocks; ++nAt)
     {
         PlaceBlocks(oPages, nAt, bEnclosed, oSpace, oPieces);
-        if (oPieces.size() < COPIED_PIECES && nAt + 1 < nBlocks)
+        const std::uint64_t nWaiting =
+            oPieces.empty() ? 0 : oPieces.back().mnTo + oPieces.back().mnBytes - oPieces.front().mnTo;
+        if (oPieces.size() < COPIED_PIECES && nWaiting < COPIED_BYTES && nAt + 1 < nBlocks)
             continue;
-        support::CopyPieces(oSource, oTarget, oPieces, oScratch);
+        const std::uint64_t nFrom = oTarget.GetSize();
+        support::CopyPieces(oSource, oTarget, oPieces, oScratch, oCopied);
         for (const support::CopiedPiece& oPiece : oPieces)
             if (bEnclosed)
                 Enclose(oPiece, oTarget);
         oPieces.clear();
+        oTarget.BeginFlush(nFrom, oTarget.GetSize() - nFrom);
     }
 }
 
@@ -179,9 +185,9 @@ void WriteDirectory(const Placed& oPlaced, const FileHeader& oHeader, std::uint6
 // values, the image first and its levels from large to small, and then the blocks, those of the smallest level first
 // and in each page in their order, each with that of its mask where every image has one and the same blocks. Blocks are
 // copied as they are stored. bCloud: with the text that tells clients so; otherwise pages stay in their order. oPages:
-// of the chain, their tags in memory; the first is the image.
+// of the chain, their tags in memory; the first is the image. oCopied: may be empty.
 void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, const FileHeader& oHeader,
-                      const support::File& oSource, support::File& oTarget, bool bCloud)
+                      const support::File& oSource, support::File& oTarget, bool bCloud, const support::Copied& oCopied)
 {
     std::vector<Placed> oSorted = ToPlace(oPages);
     if (bCloud)
@@ -200,7 +206,7 @@ void WriteCloudLayout(const std::vector<std::shared_ptr<PageModel>>& oPages, con
         PlaceDirectory(oPlaced, oHeader, &oPlaced == oSorted.data() ? support::RoomRecord::GetBytes(0) : 0, oSpace);
     support::Scratch oScratch;
     for (std::size_t nEnd = oSorted.size(); nEnd != 0; nEnd -= nTogether)
-        CopyBlocks({&oSorted[nEnd - nTogether], nTogether}, oSource, oSpace, oTarget, bEnclosed, oScratch);
+        CopyBlocks({&oSorted[nEnd - nTogether], nTogether}, oSource, oSpace, oTarget, bEnclosed, oScratch, oCopied);
     for (std::size_t nAt = 0; nAt < oSorted.size(); ++nAt)
         WriteDirectory(oSorted[nAt], oHeader,
                        nAt + 1 < oSorted.size() ? oSorted[nAt + 1].moPage.moDirectory.mnOffset : 0, oTarget);
@@ -374,8 +380,9 @@ void FileEditor::Finish()
     // Only the file that has got the name is replaced by its better form.
     if (IsNamed())
         GetFile()->Flush();
-    StoreAnew([this](support::File& oLaidOut)
-              { WriteCloudLayout(moPages, moHeader, *GetFile(), oLaidOut, moOptions.mbCloud); });
+    const support::Copied oCopied = WatchPart(GetFile()->GetSize());
+    StoreAnew([&](support::File& oLaidOut)
+              { WriteCloudLayout(moPages, moHeader, *GetFile(), oLaidOut, moOptions.mbCloud, oCopied); });
     End();
 }
 
@@ -420,7 +427,7 @@ void FileEditor::Publish(const std::vector<Written>& oWritten)
     {
         MarkChanged();
         if (!bNew)
-            GetFile()->Flush();
+            GetFile()->Flush(GetWatch());
     }
     catch (...)
     {
@@ -434,7 +441,7 @@ void FileEditor::Publish(const std::vector<Written>& oWritten)
     moHeader.Write(aHeader, moHeader.mnFirstDirectory);
     const std::size_t nPlace = moHeader.mbBigTiff ? 8 : 4;
     GetFile()->Write(bNew ? 0 : nPlace, aHeader + (bNew ? 0 : nPlace), moHeader.GetBytes() - (bNew ? 0 : nPlace));
-    GetFile()->Flush();
+    GetFile()->Flush(bNew ? GetWatch() : support::File::Watch());
 
     for (const Written& oDirectory : oWritten)
         Adopt(oDirectory);

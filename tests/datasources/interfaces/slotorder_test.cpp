@@ -11,6 +11,7 @@
 #include "datasources/interfaces/igeocodeddataset.h"
 #include "datasources/interfaces/ihistoryio.h"
 #include "datasources/interfaces/ilayoutdataset.h"
+#include "datasources/interfaces/ilevelstates.h"
 #include "datasources/interfaces/ilinkeddataset.h"
 #include "datasources/interfaces/ilutdataset.h"
 #include "datasources/interfaces/imathmodeldataset.h"
@@ -24,6 +25,7 @@
 #include "datasources/interfaces/irasterio.h"
 #include "datasources/interfaces/istoragedataset.h"
 #include "datasources/interfaces/iverifieddataset.h"
+#include "datasources/interfaces/iwatchedstoring.h"
 #include "datasources/metadata/auxiliarydata.h"
 #include "datasources/reader/ioverviewaccessor.h"
 #include "datasources/reader/irasteriterable.h"
@@ -127,6 +129,8 @@ std::vector<Table> Tables()
           Slot(&LU::CreateLUT), Slot(&LU::UpdateLUT), Slot(&LU::SetLUTDescription), Slot(&LU::DeleteLUT)}},
         {"IVerifiedDataset", {Slot(&IVerifiedDataset::Verify)}},
         {"INewFileDataset", {Slot(&INewFileDataset::KeepExisting)}},
+        {"ILevelStates", {Slot(&ILevelStates::SetChannelsValid)}},
+        {"IWatchedStoring", {Slot(&IWatchedStoring::WatchStoring)}},
         {"IStorageDataset", {Slot(&IStorageDataset::GetUnusedBytes)}},
         {"ILayoutDataset", {Slot(&ILayoutDataset::GetVariant), Slot(&ILayoutDataset::CheckCloudLayout)}},
         {"IPlaceRemoval", {Slot(&IPlaceRemoval::RemoveCRS), Slot(&IPlaceRemoval::RemoveGeocoding)}},

@@ -80,8 +80,9 @@ int RunView(const std::string& file, Options& oOptions)
     if (!IsPictureName(oOptions.target))
         throw UsageError(oOptions.target + ": pictures are written as .png or .jpg, or to - as PNG");
     const SourceFile oFile(file, eReadOnly, GivenOrNone(oOptions.noData));
-    const QuickLook oLook = MakeQuickLook(oFile, oOptions.look, ShowProgress(), GetExecutor());
-    WritePicture(oLook.picture, oOptions.target);
+    const Progress oProgress = ShowProgress();
+    const QuickLook oLook = MakeQuickLook(oFile, oOptions.look, oProgress, GetExecutor());
+    WritePicture(oLook.picture, oOptions.target, oProgress);
     if (oOptions.target != "-")
         Print(fmt::format("{}: {} x {}, {}\n", oOptions.target, oLook.picture.width, oLook.picture.height,
                           Describe(oFile, oLook)));
