@@ -76,7 +76,6 @@ struct LevelTask
 };
 
 // How a value of a level is made of those that go into it.
-// A plain value.
 struct ReductionRule
 {
     Resampling meMethod = Resampling::eAverage;

@@ -21,7 +21,6 @@ const char* StatusText(Status oStatus);
 
 // What a decoder gave. The first mnBytes bytes of the output are good whatever the status; bytes behind them are
 // undefined after a failure, and never touched beyond the given size.
-// A plain value.
 struct Result
 {
     Status moStatus = Status::eDone;

@@ -11,7 +11,6 @@ namespace krv::plugins::support
 {
 
 // Bytes that go from one file to another.
-// A plain value.
 struct CopiedPiece
 {
     std::uint64_t mnFrom = 0; // offset in the source

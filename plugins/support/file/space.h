@@ -15,7 +15,6 @@ namespace krv::plugins::support
 
 // A piece of a file. The generation tells in which state it was taken: 0 for what was there before the file was opened,
 // n for what the n-th state since then brings.
-// A plain value.
 struct Extent
 {
     std::uint64_t mnOffset = 0; // from the beginning of the file
