@@ -23,10 +23,12 @@ try
         throw std::invalid_argument("usage: filterscene SCENE RESULT");
     std::signal(SIGINT, [](int) { gnStopped = 1; });
     const auto poScene = krv::OpenReader(pFiles[1], {1});
-    const auto poWriter = krv::CreateWriter(pFiles[2], {poScene->GetWidth(), poScene->GetHeight(), 1, krv::eDT_8U});
+    const krv::RasterInfo oInfo(poScene->GetWidth(), poScene->GetHeight(), 1, krv::eDT_8U);
+    const auto poWriter = krv::CreateWriter(pFiles[2], oInfo, "TIF", "COMPRESS=DEFLATE");
     krv::CopyAllButPixels(*poScene, *poWriter);
     krv::ThreadPool oThreads;
-    krv::TileJob oJob{&oThreads};
+    krv::TileJob oJob;
+    oJob.mpoExecutor = &oThreads;
     oJob.moProgress = std::bind([] { return gnStopped == 0; }); // asked after each tile
     const bool bDone = krv::WriteTiles([&] { return krv::OpenHaloReader(pFiles[1], {1}, 1); }, Smooth, *poWriter, oJob);
     return bDone ? (poWriter->Synchronize(), 0) : 130;

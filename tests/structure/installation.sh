@@ -111,7 +111,7 @@ done
 expect "20 answers hold" cat answers.run.log
 awk -f "$oSource/tests/structure/pages.awk" "$oSource"/docs/classes/*.md "$oSource"/docs/{threads,readers-over-readers}.md >pages.cpp
 # shellcheck disable=SC2046
-quietly pages "$oCompiler" -std=c++20 -fsyntax-only -Wall pages.cpp $(pkg-config --cflags krvdatasources)
+quietly pages "$oCompiler" -std=c++20 -fsyntax-only pages.cpp $(pkg-config --cflags krvdatasources)
 # shellcheck disable=SC2046
 quietly jobs "$oCompiler" -std=c++20 "$oSource/examples/channelstats/main.cpp" -o "$oWork/channelstats" \
     $(pkg-config --cflags --libs krvoperations) -Wl,-rpath,"$oHome/lib"
