@@ -53,8 +53,7 @@ public:
     virtual bool IsLinked() const = 0;
     // Flushes pending changes to the file.
     // Throws krv::IOException when that fails; the file on the disk is then as of the last success, or the operation
-    // may be tried
-    // again. Costs as long as the disk takes.
+    // may be tried again. Costs as long as the disk takes.
     virtual void Synchronize() = 0;
     // True from the start until Close.
     virtual bool IsOpen() const = 0;

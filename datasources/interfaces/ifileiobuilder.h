@@ -26,8 +26,7 @@ public:
     virtual IDataset* Open(const std::string& fileName, AccessMode eMode) = 0;
     // Creates a new file; the caller owns the result. The image is laid out later by IRasterDataset::Create.
     // options: KEY=VALUE separated by blanks, as the format takes them. Throws DataException for options that it does
-    // not know,
-    // and for a format that only reads.
+    // not know, and for a format that only reads.
     virtual IDataset* Create(const std::string& fileName, const std::string& options) = 0;
     // Returns 0 for a file that this builder opens, anything else to decline it. pHeader: the first nHeaderLength bytes
     // of the file, zeros where the file is shorter. nReserved: always 0. Must be exact and without side effects.

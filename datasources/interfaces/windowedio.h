@@ -44,12 +44,15 @@ public:
 
 private:
     // The bytes of one pixel with all its channels.
+    // Constant; what it says times the width of a rectangle is the least pitch.
     virtual std::size_t GetPixelBytes() const = 0;
     // A rectangle with pixels, inside the image; its row r lies at the pointer + r * nPitch bytes.
+    // Throws IOException or FileFormatException, which name the file; the rectangle is then undefined.
     virtual void ReadPixels(const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch) = 0;
     // The counterpart; it stores the rectangle before it returns, or throws.
     virtual void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) = 0;
 
+    // A window that was checked and cut: its rectangle, and where that begins in the buffer.
     struct Transfer;
 
     Transfer Cut(std::int64_t nX, std::int64_t nY, unsigned int nWidth, unsigned int nHeight, const PixelRect& oPart,

@@ -55,8 +55,8 @@ public:
 
     // Creates a file of a type; types without a format of their own go to the generic builder with the type in the
     // options. A format that cannot create opens the existing file for update instead. The caller owns the result.
-    // fileType: a short name, such as "TIF". options: KEY=VALUE separated by blanks. Throws DataException for an
-    // option that is not known.
+    // fileType: a short name, such as "TIF". options: KEY=VALUE separated by blanks. Throws DataException for an option
+    // that is not known.
     IDataset* NewDataset(const std::string& fileName, const std::string& fileType, const std::string& options);
 
     // Whether Open succeeds; a builder that returns null counts as success, intended: it recognised the file.

@@ -24,8 +24,7 @@ class MaskRows;
 // polygon is filled even-odd by itself. The arguments of the polygons are those of GGLPolyRaster and mean what they
 // mean there.
 // Polygons are scan converted when they are added; a mask then costs time by its rows and their crossings. Copies are
-// apart
-// from each other. Masks may be built by several threads at once as long as nobody adds or clips.
+// apart from each other. Masks may be built by several threads at once as long as nobody adds or clips.
 class KRV_DATASOURCES_API PolygonMaskBuilder : public krv::gobs::IMaskBuilder
 {
 public:

@@ -29,8 +29,7 @@ KRV_DATASOURCES_API unsigned int GetDefaultBlue(const AuxiliaryData& oData);
 KRV_DATASOURCES_API unsigned int GetDefaultGrey(const AuxiliaryData& oData);
 
 // Set the tag in the dataset's record, which is written for each call; 0 says that there is none. The dataset is open
-// for
-// update.
+// for update.
 KRV_DATASOURCES_API void SetDefaultRed(IDataset* poDataset, unsigned int nChannel);
 KRV_DATASOURCES_API void SetDefaultGreen(IDataset* poDataset, unsigned int nChannel);
 KRV_DATASOURCES_API void SetDefaultBlue(IDataset* poDataset, unsigned int nChannel);

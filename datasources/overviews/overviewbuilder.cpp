@@ -53,7 +53,7 @@ constexpr std::uint64_t WINDOW_BYTES = std::uint64_t{16} << 20;
 // that a cascade takes at once.
 constexpr std::size_t STRIP_BYTES = std::size_t{1} << 20;
 constexpr unsigned int STRIP_ROWS = 32;
-// Of windows that were read and wait.
+// The bytes of windows that were read and wait.
 constexpr std::uint64_t MOST_AHEAD_BYTES = std::uint64_t{256} << 20;
 
 unsigned int LevelSize(unsigned int nSize, unsigned int nFactor)
@@ -201,7 +201,7 @@ void OverviewBuilder::Prepare(const std::vector<unsigned int>& oFactors)
         oLevel.mbWhole = std::find(oExisting.begin(), oExisting.end(), nFactor) == oExisting.end();
         if (!oLevel.mbWhole)
         {
-            // Before all else: what lies in another file becomes this one's then.
+            // This comes before all else: what lies in another file becomes this one's then.
             mpoAccessor->SetLevelValid(nFactor, false);
             oLevel.mpoWriter.reset(mpoAccessor->CreateRasterWriter(nFactor));
             if (oLevel.mpoWriter->GetWidth() != nWidth || oLevel.mpoWriter->GetHeight() != nHeight)

@@ -25,8 +25,7 @@ public:
 
     // A new raster of tile nIndex with the current margins, owned by the caller.
     // Tiles count from 0, row by row from the upper left. Throws OutOfBoundsException for an index beyond the last one,
-    // and what
-    // reading throws.
+    // and what reading throws.
     virtual krv::gobs::Raster* GetRaster(unsigned int nIndex) = 0;
     // The tile that holds a pixel; End() for a pixel outside the image.
     virtual RasterIterator FindRaster(unsigned int nX, unsigned int nY) = 0;

@@ -47,8 +47,8 @@ bool IsConsecutive(const std::vector<unsigned int>& oPositions)
                               { return nSecond != nFirst + 1; }) == oPositions.end();
 }
 
-// Where the channels of the result come from: a group counts as a source. Of two groups that are placed on one channel
-// the later one remains.
+// Where the channels of the result come from: a group counts as a source. The later one of two
+// groups that are placed on one channel remains.
 std::vector<krv::raster::MergeChannel> PlaceChannels(const std::vector<Group>& oGroups, std::size_t nChannels,
                                                      eChannelPlacement ePlacement)
 {
@@ -117,7 +117,7 @@ struct MultiTypeReader::State
     bool mbOverviewsDisabled = false;               // the readers were ready-made
     std::unique_ptr<krv::raster::Merger> mpoMerger; // made by the first reading
     std::unique_ptr<ValiditySource> mpoValidity;    // made when it is asked for, as the following
-    // Of ready-made readers, what no value of theirs says, by the group.
+    // What no value of ready-made readers says, by the group.
     std::vector<std::pair<std::size_t, std::unique_ptr<ReaderValidity>>> moWords;
 };
 

@@ -50,6 +50,8 @@ public:
     // Channels of a dataset that stays the caller's and outlives the reader.
     MultiTypeReader(IDataset* poDataset, const std::vector<unsigned int>& oChannels,
                     eChannelPlacement ePlacement = eFromFirstPlace);
+
+    // The type of all pixels; values that it does not hold are rounded and saturated.
     MultiTypeReader(IDataset* poDataset, const std::vector<unsigned int>& oChannels, const krv::gobs::DataType& oType,
                     eChannelPlacement ePlacement = eFromFirstPlace);
     // Ready-made readers of one channel each and of one size, reader n for channel n of the result; they are taken
@@ -69,6 +71,8 @@ public:
     void ReadRaster(krv::gobs::Raster* poRaster) override;
     // The block of the first group's format, for all groups.
     void SetOptimalTileSize() override;
+
+    // Of all groups at once.
     void SetTileSize(unsigned int nWidth, unsigned int nHeight) override;
     void SetMargins(unsigned int nXMargin, unsigned int nYMargin, eMarginBehaviour eBehaviour) override;
     const std::vector<IChannelInfo*>& GetChannelsInfo() const override;
@@ -80,6 +84,8 @@ public:
     const krv::gobs::DataType& GetDataType() const override;
 
     IDataset* GetDataset() const override;
+
+    // Of the dataset, in the order of the result.
     const std::vector<unsigned int>& GetChannels() const override;
 
     // What the dataset says of the channels. Of ready-made readers that stand on something else: their no-data values,

@@ -22,6 +22,7 @@ public:
     class Iterator
     {
     public:
+        // What range loops and algorithms of the standard library ask for.
         using iterator_category = std::input_iterator_tag;
         using difference_type = std::ptrdiff_t;
         using value_type = std::unique_ptr<krv::gobs::Raster>;
@@ -50,6 +51,8 @@ public:
 
     // From the top left tile on, row by row.
     Iterator begin() const { return Iterator(mpoIterable->Begin()); }
+
+    // The position behind the last tile; it reads nothing.
     Iterator end() const { return Iterator(mpoIterable->End()); }
 
 private:

@@ -36,7 +36,7 @@ ReaderValidity::ReaderValidity(IRasterReader& oReader, krv::gobs::BkgdRule eRule
     const bool bEach = eRule == krv::gobs::eAnyChannel && oReader.GetChansCount() > 1;
     if (mpoFacet == nullptr || bEach)
         mpoSource = MakeSource(oReader, eRule);
-    // Beside the reader's own word values are enough, unless channels have masks of their own.
+    // Values are enough beside the reader's own word, unless channels have masks of their own.
     if (mpoFacet != nullptr && bEach && !mpoSource->HasChannelMasks())
         mpoSource = std::make_unique<ValiditySource>(oReader, eRule);
     const bool bSource =

@@ -189,7 +189,7 @@ std::vector<std::string> CopyAllButPixels(const IRasterReader& oSource, IRasterW
         DropOwnReferences(oRecord, FindFacet<IDataset>(oSource)->GetName());
     }
     oLosses.Try("the metadata", [&] { oTarget.SetAuxiliaryData(oRecord); });
-    // After the record, which may hold a model as text.
+    // Models come after the record, which may hold one as text.
     if (IsInPlace(oSource))
         CopyModels(oSource, oTarget, oLosses);
     return oLosses.Take();

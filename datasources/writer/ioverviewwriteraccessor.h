@@ -21,8 +21,7 @@ public:
     virtual IRasterWriter* CreateRasterWriter(unsigned int nLevel) = 0;
     // Lays out a level for all channels of the file.
     // Its pixels are 0 and it is not valid until SetValid says so. Throws DataException for a level that exists and for
-    // a dataset
-    // that is not open for updating.
+    // a dataset that is not open for updating.
     virtual void CreateLevel(unsigned int nLevel) = 0;
     // Says whether a channel of a level is up to date. Throws OutOfBoundsException for a position outside the list,
     // DataException for an unknown level and a dataset that is not open for updating.

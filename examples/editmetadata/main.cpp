@@ -2,6 +2,8 @@
 // file that has lost them. Pixels stay as they are.
 #include <krv/krv.h>
 
+#include "toolkit/core/numbertext.h"
+
 #include <exception>
 #include <iostream>
 #include <stdexcept>
@@ -10,7 +12,8 @@
 int main(int nArguments, char** pArguments)
 try
 {
-    if (nArguments != 3)
+    const auto oNoData = krv::ParseNumber<double>(nArguments == 3 ? pArguments[2] : "");
+    if (!oNoData)
         throw std::invalid_argument("usage: editmetadata FILE NO-DATA");
     // Opens no pixel; an image in a format that cannot be updated is refused here.
     const auto poWriter = krv::OpenWriter(pArguments[1]);
@@ -19,7 +22,7 @@ try
     krv::AuxiliaryData oRecord = poWriter->GetAuxiliaryData();
     oRecord.SetFileMetadataValue("OPERATOR", "me");
     oRecord.SetChannelDescription("edited channel", 1);
-    krv::SetNoData(oRecord, std::stod(pArguments[2]), 1); // NaN and 64-bit integers are exact
+    krv::SetNoData(oRecord, *oNoData, 1); // NaN and 64-bit integers are exact
     poWriter->SetAuxiliaryData(oRecord);
 
     if (!krv::GetCRS(*poWriter))

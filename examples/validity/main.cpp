@@ -3,11 +3,10 @@
 #include <krv/krv.h>
 
 #include "datasources/interfaces/ibitmapdataset.h"
+#include "toolkit/core/numbertext.h"
 
 #include <algorithm>
-#include <exception>
 #include <iostream>
-#include <string>
 
 static void MarkDark(krv::IDataset& oDataset, int nLimit)
 {
@@ -47,10 +46,11 @@ static std::uint64_t CountValid(krv::IDataset& oDataset)
 int main(int nArguments, char** pArguments)
 try
 {
-    if (nArguments != 3)
+    const auto oLimit = krv::ParseNumber<int>(nArguments == 3 ? pArguments[2] : "");
+    if (!oLimit)
         throw std::invalid_argument("usage: validity FILE LIMIT");
     const auto poDataset = krv::Open(pArguments[1], krv::eUpdate);
-    MarkDark(*poDataset, std::stoi(pArguments[2]));
+    MarkDark(*poDataset, *oLimit);
     std::cout << CountValid(*poDataset) << " pixels are valid\n";
 }
 catch (const std::exception& oError)

@@ -10,8 +10,7 @@ class Raster;
 
 // Makes a mask for a raster's region. The order of the virtual operations is fixed.
 // Builders of this library: by values (MaskDecisionBuilder), polygons (PolygonMaskBuilder), bitmaps (BitmapMaskBuilder)
-// and
-// everything that an image declares (ValiditySource). What a set bit means is told by each.
+// and everything that an image declares (ValiditySource). What a set bit means is told by each.
 class KRV_GOBS_API IMaskBuilder
 {
 public:
@@ -19,8 +18,7 @@ public:
 
     // A new mask over the raster's full extent, owned by the caller.
     // The raster's pixels count only where the builder decides by values; else its place and size do. Throws what
-    // reading a
-    // mask from a file throws.
+    // reading a mask from a file throws.
     virtual Mask* BuildMask(const Raster& oRaster) const = 0;
 };
 

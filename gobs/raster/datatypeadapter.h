@@ -45,6 +45,8 @@ public:
         default:
             break;
         }
+
+        // The line is part of the contract.
         throw ParameterException("Could not determine byte size for provided datatype",
                                  ParameterException::eInvalidValue, "eDataType", Place::AtLine(86));
     }
@@ -53,6 +55,7 @@ public:
     // DataType::Describe never throws and is the one for messages.
     static std::string TypeToString(NativeDataTypeCode eDataType)
     {
+        // In the order of the codes.
         constexpr const char* TEXTS[] = {"8U",  "8S",  "16U",  "16S",  "32U",  "32S",  "32R", "64U",
                                          "64S", "64R", "C16U", "C16S", "C32S", "C32R", "C64R"};
         if (eDataType < eDT_8U || eDataType > eDT_C64R)

@@ -49,8 +49,7 @@ struct InterpolationWindow
 // rounded half to even and saturated, complex values weighed part by part. A result does not depend on those that are
 // made with it. Any thread.
 // The order of the virtual operations is fixed. Where all pixels of a window are valid a quicker way is taken, with the
-// same
-// results.
+// same results.
 class KRV_GOBS_API IInterpolator
 {
 public:

@@ -87,8 +87,7 @@ struct ReductionRule
 // windows, and puts the pixels of levels into their targets as soon as they are
 // known.
 // One thread at a time. Windows lie side by side: each pixel of the bounds comes once. The order of the virtual
-// operations is
-// fixed.
+// operations is fixed.
 class KRV_GOBS_API ILevelReducer
 {
 public:

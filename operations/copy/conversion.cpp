@@ -280,7 +280,7 @@ void ConvertPower(const CopyRequest& oRequest, const TargetForm& oForm, const Pr
                   krv::threading::IExecutor* poExecutor)
 {
     if (oRequest.sources.size() != 1 || oRequest.type || oRequest.promote || oRequest.noData)
-        throw RequestException("--power takes one file, and neither --type nor --no-data: the power has its own");
+        throw RequestException("the power is that of one file, and has a type and a no-data value of its own", "power");
     const SourceFile oSource(oRequest.sources.front());
     PowerRequest oPower;
     oPower.moChannels = oRequest.channels.empty() ? oRequest.channels : oSource.CheckChannels(oRequest.channels);
@@ -295,7 +295,8 @@ void ConvertScaled(const CopyRequest& oRequest, const TargetForm& oForm, const P
                    krv::threading::IExecutor* poExecutor)
 {
     if (oRequest.sources.size() != 1 || oRequest.promote || oRequest.power)
-        throw RequestException("--scale and --unscale take one file, and neither --power nor --type promoted");
+        throw RequestException("values of one file are scaled, neither to a promoted type nor as power",
+                               oRequest.unscale ? "unscale" : "scale");
     const SourceFile oSource(oRequest.sources.front(), eReadOnly, oRequest.noData);
     const auto Open = [&oRequest](const SourceFile& oFile)
     {

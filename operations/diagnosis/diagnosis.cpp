@@ -277,7 +277,7 @@ void TryParts(IDataset& oDataset, const std::string& subject, std::vector<Findin
                         {false, subject,
                          fmt::format("outdated levels are passed over, since pixels changed after they were made: {}",
                                      fmt::join(oOutdated, ", ")),
-                         fmt::format("make them anew: krv overviews FILE --levels {}", fmt::join(oOutdated, ","))});
+                         "make them anew", RemedyStep::eBuildLevels, oOutdated});
             });
     if (auto* const poBitmaps = dynamic_cast<IBitmapDataset*>(&oDataset); poBitmaps != nullptr)
         Try("the bitmaps",
@@ -328,7 +328,8 @@ bool CheckLinks(const IDataset& oDataset, const std::string& subject, std::vecto
         bThere = bThere && why.empty();
         oFindings.push_back({why.empty(), subject,
                              fmt::format("its pixels lie in {}{}{}", file, why.empty() ? "" : ": ", why),
-                             why.empty() ? "" : "put that file back to where the link leads, or link anew (krv link)"});
+                             why.empty() ? "" : "put that file back to where the link leads, or link anew",
+                             why.empty() ? RemedyStep::eNone : RemedyStep::eLinkAnew});
     }
     return bThere;
 }
@@ -463,28 +464,32 @@ std::vector<Finding> CheckFile(const std::string& file, const std::vector<Loaded
     if (const std::string seems = bRecognised ? std::string() : DescribeUnknown(file); !seems.empty())
         oFindings.push_back({false, "file " + file, "no format recognises it: " + seems, {}});
     else if (!bRecognised)
-        oFindings.push_back({false, "file " + file, "no format recognises it",
-                             "install the plug-in of its format, or convert it to one that `krv formats` lists; where "
-                             "it holds plain pixels, which no header beside it describes, write an ENVI header " +
-                                 file + ".hdr with their size, data type and byte order"});
+        oFindings.push_back(
+            {false, "file " + file, "no format recognises it",
+             "install the plug-in of its format, or convert it to one that is installed; where it holds "
+             "plain pixels, which no header beside it describes, write an ENVI header " +
+                 file + ".hdr with their size, data type and byte order",
+             RemedyStep::eConvert});
     return oFindings;
 }
 
 std::vector<Finding> CheckCloudLayout(const std::string& file)
 {
-    constexpr char REMEDY[] = "krv convert IN OUT.tif --options \"LAYOUT=COG COMPRESS=DEFLATE\" makes a copy that is";
+    constexpr char REMEDY[] = "make a copy that is, with the option LAYOUT=COG";
     const SourceFile oFile(file);
     auto* const poLayout = dynamic_cast<ILayoutDataset*>(&oFile.GetDataset());
     const auto oReasons = poLayout != nullptr ? poLayout->CheckCloudLayout() : std::nullopt;
     const std::string subject = "layout of " + file;
     if (!oReasons)
-        return {{false, subject, "files of this format are not laid out for reading over a network", REMEDY}};
+        return {{false, subject, "files of this format are not laid out for reading over a network", REMEDY,
+                 RemedyStep::eCloudCopy}};
     if (oReasons->empty())
         return {{true, subject, "it is laid out for reading over a network (COG)", {}}};
     std::vector<Finding> oFindings;
     for (const std::string& reason : *oReasons)
         oFindings.push_back({false, subject, reason, {}});
     oFindings.back().remedy = REMEDY;
+    oFindings.back().step = RemedyStep::eCloudCopy;
     return oFindings;
 }
 

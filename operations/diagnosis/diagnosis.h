@@ -14,6 +14,16 @@ class IFileIOBuilder;
 namespace krv::operations
 {
 
+// What a program could do by itself to mend what a finding tells.
+enum class RemedyStep
+{
+    eNone,
+    eBuildLevels, // BuildOverviews
+    eLinkAnew,    // Link
+    eConvert,     // Convert, into a format that is there
+    eCloudCopy    // Convert, with the option LAYOUT=COG
+};
+
 // One thing that was looked at. A failed one says what to do.
 // Texts are for people; programs go by `good`.
 struct Finding
@@ -22,6 +32,8 @@ struct Finding
     std::string subject; // the file, or the piece of the installation
     std::string found;   // one sentence
     std::string remedy;  // one sentence; empty for what is good
+    RemedyStep step = RemedyStep::eNone;
+    std::vector<unsigned int> levels = {}; // that are to be built
 };
 
 // A plug-in that loaded, with a builder of its own, apart from the manager's.

@@ -138,7 +138,7 @@ struct Entry
     bool link = false; // rather than copied
 };
 
-// Of the installation, or of the home itself, which has its own.
+// The entries of the installation, or of the home itself, which has its own.
 std::vector<Entry> ListEntries(const fs::path& oHome, const fs::path& oRegistry)
 {
     std::vector<Entry> oEntries;

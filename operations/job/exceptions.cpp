@@ -8,6 +8,11 @@ RequestException::RequestException(const std::string& message, const krv::Place&
 {
 }
 
+RequestException::RequestException(const std::string& message, const std::string& field, const krv::Place& oPlace)
+    : krv::Exception(message, oPlace), moField(field)
+{
+}
+
 RequestException::~RequestException() = default;
 
 StoppedException::StoppedException(const krv::Place& oPlace) : krv::Exception("stopped", oPlace) {}

@@ -14,7 +14,17 @@ class KRV_OPERATIONS_API RequestException : public krv::Exception
 {
 public:
     explicit RequestException(const std::string& message, const krv::Place& oPlace = krv::Place::Current());
+    // field: the member of the request that is to be another one, by its name in the header, such as "coordinates".
+    RequestException(const std::string& message, const std::string& field,
+                     const krv::Place& oPlace = krv::Place::Current());
     ~RequestException() override;
+
+    // By it a program tells its user where in its own window, or by which option, to ask for something else. Empty
+    // where the message says all.
+    const std::string& GetField() const { return moField; }
+
+private:
+    std::string moField;
 };
 
 // The caller's progress function said to stop; the message is "stopped".

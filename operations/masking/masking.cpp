@@ -271,9 +271,10 @@ private:
         if (nBitmap != 0)
             CheckBitmap(oFile, nBitmap);
         if (bValidity && nMask != 0 && nBitmap != nMask)
-            throw RequestException(fmt::format("{}: bitmap {} is the validity mask, and there is only one; --write {} "
-                                               "replaces it, --zone stores a zone beside it",
-                                               oFile.GetName(), nMask, nMask));
+            throw RequestException(fmt::format("{}: bitmap {} is the validity mask, and there is only one; write to "
+                                               "that bitmap to replace it, or store a zone beside it",
+                                               oFile.GetName(), nMask),
+                                   "target");
         if (nBitmap == 0)
             nBitmap = oBitmaps.CreateBitmap();
         if (bValidity)

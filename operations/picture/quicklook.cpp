@@ -319,7 +319,7 @@ void AddLegend(const SourceFile& oFile, QuickLook& oLook, const Threads& oThread
                                krv::datasources::GetClassNames(oFile.GetMetadata(), oChoice.channels.front()),
                                oLook.picture);
     if (oLook.stretches.size() != 1)
-        throw RequestException("a legend is of one channel, and three are shown; choose one (--channels 1)");
+        throw RequestException("a legend is of one channel, and three are shown; choose one", "channels");
     const ValueScale oScale = oLook.decibels || oLook.power ? ValueScale() : oFile.GetScale(oChoice.channels.front());
     const Stretch& oStretch = oLook.stretches.front();
     const double nLow = oScale(oStretch.low), nHigh = oScale(oStretch.high);

@@ -73,8 +73,8 @@ Placer MakePlacer(const SourceFile& oFile, const SampleRequest& oRequest, Sample
             return true;
         };
     if (!oPlace)
-        throw RequestException(
-            oFile.GetName() + ": the file does not say where it lies; give the points in pixels (--coordinates pixel)");
+        throw RequestException(oFile.GetName() + ": the file does not say where it lies; give the points in pixels",
+                               "coordinates");
     oResult.placedBy = oPlace->GetKind();
     if (!bNamed)
         return PlaceIn(*oPlace);

@@ -492,7 +492,7 @@ Gatherers MakeGatherers(const krv::gobs::DataType& oType, const std::vector<Gath
 constexpr std::uint64_t PIECE_BYTES = std::uint64_t{1} << 20;
 constexpr std::uint64_t MOST_TOGETHER = 8;
 
-// Of one tile; oHow: one per channel.
+// What one tile gives; oHow: one per channel.
 struct TileStatistics
 {
     Gatherers channels;
@@ -592,7 +592,7 @@ std::vector<ChannelStatistics> GatherTiles(FileWorkers<Worker>& oWorkers,
     return oResults;
 }
 
-// Of channels of one type.
+// Statistics of channels of one type.
 std::vector<ChannelStatistics> StatisticsOf(const SourceFile& oFile, const std::vector<unsigned int>& oChannels,
                                             const std::vector<Gathering>& oHow, bool bRaw, const Progress& oProgress,
                                             krv::threading::IExecutor* poExecutor)
@@ -772,7 +772,8 @@ std::vector<ChannelStatistics> ComputeStatistics(const SourceFile& oFile, const 
         throw RequestException("percentiles lie between 0 and 100");
     if (oRequest.power && (oRequest.bins != 0 || !oRequest.percentiles.empty()))
         throw RequestException(
-            "histograms and percentiles of the power need a file that holds it; make one with krv convert --power");
+            "histograms and percentiles of the power need a file that holds it; make one by copying the power",
+            "power");
     if (oRequest.power)
         return PowerStatistics(oFile, oRequest, oProgress, poExecutor);
     const auto oChannels = oFile.CheckChannels(oRequest.channels);

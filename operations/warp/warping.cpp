@@ -227,7 +227,8 @@ WarpResult Warp(const WarpRequest& oRequest, const TargetForm& oForm, const Prog
     const bool bTaken = oResult.method == Resampling::eNearest || oResult.method == Resampling::eMode;
     if (poTable != nullptr && !bTaken)
         throw RequestException(oFile.GetName() +
-                               ": its pixels are indices of a colour table; use --resampling mode or nearest");
+                                   ": its pixels are indices of a colour table; only the methods mode and nearest fit",
+                               "method");
 
     TransformRequest oTransform{oGrid.width, oGrid.height, oResult.method};
     oTransform.mbExact = oRequest.exact;

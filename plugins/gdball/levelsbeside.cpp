@@ -162,7 +162,7 @@ void LevelsBeside::OpenFile()
     mpoFile.reset();
 }
 
-// Of pages that would be one level the larger one counts.
+// The larger one counts where two pages would be one level.
 void LevelsBeside::ListLevels()
 {
     moLevels.clear();

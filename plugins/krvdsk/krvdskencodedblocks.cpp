@@ -20,7 +20,7 @@ namespace
 
 // Strips of fewer pixels are not taken over as tiles, unless there is but one.
 constexpr std::uint64_t LEAST_STRIP = 32768;
-// Of values that keep fewer bits than their type has: how many. Others do not take such blocks: they store so many.
+// How many bits are kept of values that have fewer than their type. Others do not take such blocks: they store so many.
 constexpr const char* KEPT_BITS = "KEPTBITS";
 
 // Whether all channels are stored in one way, in one plane or each in its own.
@@ -140,7 +140,7 @@ private:
 
 } // namespace
 
-// Of a linked file that shows all of another one as it is.
+// Answers for a linked file that shows all of another one as it is.
 krv::datasources::IEncodedBlocks* KrvdskDataset::FindLinkedBlocks(unsigned int nLevel) const
 {
     const Catalogue& oCatalogue = GetCatalogue();

@@ -125,7 +125,7 @@ void WriteForm(const RawForm& oForm, HeaderText& oHeader)
 
 std::optional<std::uint64_t> RawForm::CountBytes() const
 {
-    // Of a width and a height below 2^31, of channels below 2^17 and of values of up to 16 bytes.
+    // Width and height are below 2^31, channels below 2^17, and values have up to 16 bytes.
     const std::uint64_t nValueBytes = moType.GetValueBits() / 8;
     const std::uint64_t nPixels = std::uint64_t{mnWidth} * mnHeight;
     constexpr std::uint64_t MOST = std::uint64_t{1} << 62;

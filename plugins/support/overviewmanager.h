@@ -41,8 +41,8 @@ private:
     void CheckWriting(const char* pWhat, const Place& oPlace) const override { moDataset.CheckWriting(pWhat, oPlace); }
     krv::datasources::IRasterIO* OpenLevelIO(unsigned int nLevel, const std::vector<unsigned int>& oChannels) override;
 
-    const Dataset& moDataset;
-    LevelStore& moLevels;
+    const Dataset& moDataset; // borrowed
+    LevelStore& moLevels;     // borrowed
 };
 
 } // namespace krv::plugins::support

@@ -81,6 +81,7 @@ for oText in "1000 x 1000" "no-data -9999" "500 x 500" "UTM zone 19S" "height in
 done
 expect " 785321 " "$oHome/bin/krv" stats hill.tif # the pixels within 500 of the middle
 refused "hill.tif: The dataset already exists" example newfile hill.tif
+refused "missing.tif: No such file" example filterscene missing.tif smooth.tif
 quietly filtered example filterscene rgb.tif smooth.tif
 expect "600 x 600" "$oHome/bin/krv" info smooth.tif
 cp rgb.tif edited.tif
@@ -108,6 +109,9 @@ for oProgram in answers readme; do
     quietly "$oProgram.run" "./$oProgram"
 done
 expect "20 answers hold" cat answers.run.log
+awk -f "$oSource/tests/structure/pages.awk" "$oSource"/docs/classes/*.md "$oSource"/docs/{threads,readers-over-readers}.md >pages.cpp
+# shellcheck disable=SC2046
+quietly pages "$oCompiler" -std=c++20 -fsyntax-only pages.cpp $(pkg-config --cflags krvdatasources)
 # shellcheck disable=SC2046
 quietly jobs "$oCompiler" -std=c++20 "$oSource/examples/channelstats/main.cpp" -o "$oWork/channelstats" \
     $(pkg-config --cflags --libs krvoperations) -Wl,-rpath,"$oHome/lib"

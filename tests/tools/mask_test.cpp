@@ -253,7 +253,7 @@ TEST_F(MaskCommand, FailuresSayWhyOnOneLineAndChangeNothing)
         {{moFile, "--polygon", R"({"type":"Polygon",)"}, 2, "not valid: parse error"},
         {{moFile, "--polygon", R"({"type":"Polygon","coordinates":[[[0,1e999],[1,2]]]})"}, 2, "GeoJSON"},
         {{moFile, "--polygon", R"({"type":"Polygon","coordinates":[[[0,95],[1,2],[3,4]]]})"}, 1, "0 95"},
-        {{demo, "--polygon", square}, 1, "not georeferenced"},
+        {{demo, "--polygon", square}, 2, "not georeferenced"},
         {{demo, "--polygon", square, "--coordinates", "pixel", "--write", "new"}, 1, "plain.demo"},
         {{demo, "--no-data"}, 1, "no no-data value"},
         {{moFile, "--no-data", "--png", moFile}, 2, "the file itself"},

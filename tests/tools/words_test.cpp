@@ -86,10 +86,40 @@ TEST(Words, TheCommandDescribesItself)
     // What the shells make of them.
     EXPECT_EQ(krv::test::RunProgram("/bin/bash", {"-n", oFolder.File("share/bash-completion/completions/krv")}).code,
               0);
-    const auto oCompleted = krv::test::RunProgram(
-        "/bin/bash", {"-c", "source " + oFolder.File("share/bash-completion/completions/krv") +
-                                "; COMP_WORDS=(krv view a b --stretch m); COMP_CWORD=5; _krv; echo ${COMPREPLY[@]}"});
-    EXPECT_EQ(oCompleted.output, "minmax\n") << oCompleted.errors;
+    const auto Complete = [&](const std::string& words, const char* pAt)
+    {
+        return krv::test::RunProgram("/bin/bash",
+                                     {"-c", "source " + oFolder.File("share/bash-completion/completions/krv") +
+                                                "; COMP_WORDS=(" + words + "); COMP_CWORD=" + pAt +
+                                                "; _krv; echo ${COMPREPLY[@]}"})
+            .output;
+    };
+    EXPECT_EQ(Complete("krv view a b --stretch m", "5"), "minmax\n");
+    EXPECT_EQ(Complete("krv convert a b --type C32", "5"), "C32S C32R\n");
+    EXPECT_EQ(Complete("krv convert a b --window 1", "5"), "\n");
+}
+
+TEST(Words, OneFileOfSeveralThatFailsLeavesTheOthers)
+{
+    const TempFolder oFolder;
+    const std::string first = oFolder.File("a b.tif"), last = oFolder.File("grün.tif");
+    krv::test::RunProgram(KRV_SAMPLESCENE_PROGRAM, {oFolder.GetPath(), "--size", "200"});
+    std::filesystem::rename(oFolder.File("rgb.tif"), first);
+    std::filesystem::copy(first, last);
+    for (const char* pVerb : {"info", "stats", "checksum", "edit"})
+    {
+        std::vector<std::string> oArguments = {pVerb, first, oFolder.File("missing.tif"), last, "--json"};
+        if (oArguments.front() == "edit")
+            oArguments.insert(oArguments.end(), {"--tag", "A=B"});
+        const auto oResult = RunKrv(oArguments);
+        EXPECT_EQ(oResult.code, 1) << pVerb;
+        EXPECT_NE(oResult.errors.find("missing.tif"), std::string::npos) << oResult.errors;
+        const json oFiles = oResult.Json()["files"];
+        ASSERT_EQ(oFiles.size(), 2U) << pVerb;
+        EXPECT_EQ(oFiles[1]["file"], last);
+    }
+    // What the library says of a request, the command names the option of.
+    ExpectFailure(RunKrv({"convert", first, oFolder.File("c.tif"), "--format", "NIX"}), 2, {"NIX", "(--format)"});
 }
 
 TEST(Words, AHomeOfOnesOwnIsMadeWholeOrNotAtAll)

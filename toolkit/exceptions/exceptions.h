@@ -13,8 +13,8 @@ namespace krv
 // Root of everything the toolkit throws. what() is the message; the place says where it was thrown. Each kind is made
 // either from a place, by default that of the throw, or from the full signature of a function, a source file and a
 // line, which are kept as they are: for a failure that somebody else reports, such as another process.
-// Example: catch (const krv::Exception& oError) { std::cerr << oError.what() << "\n"; }
-// Any thread may throw one, and copies share nothing, so that one may go to another thread by std::exception_ptr.
+// Example: catch (const krv::Exception& oError) { std::cerr << oError.what() << "\n"; } Any thread may throw one, and
+// copies share nothing, so that one may go to another thread by std::exception_ptr.
 class KRV_TOOLKIT_API Exception : public std::exception
 {
 public:
@@ -87,7 +87,7 @@ public:
 
 private:
     int mnType;
-    std::string moParameter;
+    std::string moParameter; // as the source names it
 };
 
 // Something is wrong with a file; the base of the kinds below.
@@ -105,7 +105,7 @@ public:
     const std::string& GetFileName() const { return moFileName; }
 
 private:
-    std::string moFileName;
+    std::string moFileName; // as it was given
 };
 
 // The file is not there or cannot be opened.
@@ -187,7 +187,7 @@ public:
     int GetType() const { return mnType; }
 
 private:
-    std::string moLibraryFile;
+    std::string moLibraryFile; // as the description names it
     int mnType;
 };
 

@@ -19,8 +19,7 @@ using TerrainHeight = std::function<bool(double nLongitude, double nLatitude, do
 // above and a point below the terrain where that does not converge. At a step of the terrain the place of the step is
 // the result. False, with the results untouched, when the model does not reach a point or its terrain is not known.
 // Example, on a plane of 400 m: FindGround(oModel, 100.5, 200.5, [](double, double, double& nHeight) { nHeight = 400;
-// return
-// true; }, 400, nLongitude, nLatitude, nHeight).
+// return true; }, 400, nLongitude, nLatitude, nHeight).
 KRV_TOOLKIT_API bool FindGround(const IMathModel& oModel, double nColumn, double nRow, const TerrainHeight& oTerrain,
                                 double nStartHeight, double& nLongitude, double& nLatitude, double& nHeight);
 

@@ -29,8 +29,7 @@ public:
 
     // Replaces the sink and returns the former one; an empty sink is the standard one.
     // Any thread. A program with a window sets one at its start, to show warnings in it. The sink may be called by
-    // several
-    // threads at once.
+    // several threads at once.
     static Sink SetSink(Sink oSink);
 };
 

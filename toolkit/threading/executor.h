@@ -10,8 +10,7 @@ namespace krv::threading
 // Threads that a program lends to the library, which starts none of its own. Whoever wants work on several cores hands
 // it one of these; without one it is done by the thread that asks for it.
 // A program with threads of its own makes a small class of it; others take ThreadPool. The order of the operations is
-// public
-// and fixed.
+// public and fixed.
 class KRV_TOOLKIT_API IExecutor
 {
 public:

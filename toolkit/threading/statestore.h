@@ -43,7 +43,7 @@ public:
         T* operator->() const { return mpoState.get(); }
 
     private:
-        StateStore& moStore;
+        StateStore& moStore; // outlives the use
         std::unique_ptr<T> mpoState;
     };
 
@@ -74,7 +74,7 @@ private:
         moGiven.notify_one();
     }
 
-    Make moMake;
+    Make moMake;                            // asked without the lock
     std::mutex moMutex;                     // guards what follows
     std::condition_variable moGiven;        // told when a state comes back
     std::vector<std::unique_ptr<T>> moFree; // the one given back last is taken first: its memory is warm

@@ -393,7 +393,7 @@ void TryDamaged(const Plugin& oPlugin, const std::string& file, const std::strin
     {
         oFindings.push_back(what + ": " + DescribeException());
     }
-    // Of the processor: a busy machine is no fault of the plug-in.
+    // Time is that of the processor: a busy machine is no fault of the plug-in.
     const double dSeconds = static_cast<double>(std::clock() - nStart) / CLOCKS_PER_SEC;
     Expect(oFindings, dSeconds < MAX_SECONDS, what, ": takes ", dSeconds, " s");
     // Not the difference: the kernel counts pages by processor, and the peak that it tells may even sink a little.

@@ -146,10 +146,13 @@ std::string DescribeMistake(const CLI::App* poApp, const CLI::Error& oError)
         const std::string nearest = FindNearestWord(word.substr(0, word.find('=')), oNames);
         text = "there is no option " + word + (nearest.empty() ? "" : "; is " + nearest + " meant?");
     }
-    return "krv: " + OneLine(text) + "; `krv " + (oUsed.empty() ? "" : oVerb.get_name() + " ") + "--help` explains\n";
+    if (text == "A subcommand is required")
+        text = "a verb is required";
+    return "krv: " + OneLine(text) + (text.ends_with('?') ? " `krv " : "; `krv ") +
+           (oUsed.empty() ? "" : oVerb.get_name() + " ") + "--help` explains\n";
 }
 
-int RunVerb(const Selection& oSelection, bool bVerbose)
+int RunVerb(const Selection& oSelection)
 {
     try
     {
@@ -157,9 +160,9 @@ int RunVerb(const Selection& oSelection, bool bVerbose)
         TellWarnings("");
         return nCode;
     }
-    catch (const UsageError& oError)
+    catch (const UsageError&)
     {
-        std::fprintf(stderr, "krv: %s\n", OneLine(oError.what()).c_str());
+        std::fprintf(stderr, "krv: %s\n", DescribeError("", oSelection.verbose).c_str());
         return 2;
     }
     catch (const operations::StoppedException&)
@@ -171,7 +174,7 @@ int RunVerb(const Selection& oSelection, bool bVerbose)
     catch (...)
     {
         TellWarnings(CurrentMessage());
-        std::fprintf(stderr, "krv: %s\n", DescribeError(oSelection.file, bVerbose).c_str());
+        std::fprintf(stderr, "krv: %s\n", DescribeError(oSelection.file, oSelection.verbose).c_str());
         return 1;
     }
 }
@@ -184,10 +187,9 @@ int RunApplication(int nArguments, char** pArguments)
     oApp.formatter(std::make_shared<HelpFormatter>());
     oApp.set_help_flag("-h,--help", "Show this help");
     Selection oSelection;
-    bool bVerbose = false;
     unsigned int nThreads = 0;
     oApp.set_version_flag("--version", "krv " KRV_VERSION, "Show the version");
-    oApp.add_flag("--verbose", bVerbose, "Errors also name the function, source file and line");
+    oApp.add_flag("--verbose", oSelection.verbose, "Errors also name the function, source file and line");
     oApp.add_option("--threads", nThreads, "How many threads work at a time; by default one for each processor")
         ->check(CLI::Range(1U, MOST_THREADS));
     oApp.failure_message(&DescribeMistake);
@@ -226,7 +228,7 @@ int RunApplication(int nArguments, char** pArguments)
     krv::nspio::Warning::SetSink(&NoteWarning);
     WatchForInterrupt();
     SetThreadCount(nThreads);
-    return RunVerb(oSelection, bVerbose);
+    return RunVerb(oSelection);
 }
 
 } // namespace krv::tool

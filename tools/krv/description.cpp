@@ -6,6 +6,7 @@
 #include <CLI/CLI.hpp>
 #include <fmt/format.h>
 
+#include <algorithm>
 #include <sstream>
 #include <vector>
 
@@ -144,19 +145,66 @@ std::string NameList(const std::vector<const CLI::Option*>& oOptions)
     return fmt::format("{}", fmt::join(oNames, " "));
 }
 
+// Prints the short names of the formats, as a shell does.
+constexpr char LIST_FORMATS[] = "krv formats 2>/dev/null | sed -n '2,/^$/s/ .*//p'";
+constexpr char TYPES[] = "8U 8S 16U 16S 32U 32S 32R 64U 64S 64R C16U C16S C32S C32R C64R promoted";
+
+bool HasName(const CLI::Option& oOption, const std::vector<std::string>& oNames)
+{
+    return std::ranges::any_of(oNames, [&](const std::string& name) { return oOption.check_lname(name); });
+}
+
+// What a shell may offer behind an option.
+enum class Offer
+{
+    eWords,
+    eFormats,
+    eFiles,
+    eNothing
+};
+
+Offer OfferOf(const CLI::Option& oOption)
+{
+    if (!GetWordsOf(oOption).empty() || HasName(oOption, {"type"}))
+        return Offer::eWords;
+    if (HasName(oOption, {"format"}))
+        return Offer::eFormats;
+    return HasName(oOption, {"add", "crs", "home", "like", "png", "polygon"}) ? Offer::eFiles : Offer::eNothing;
+}
+
+std::string WordsText(const CLI::Option& oOption)
+{
+    const std::vector<std::string> oWords = GetWordsOf(oOption);
+    return oWords.empty() ? TYPES : fmt::format("{}", fmt::join(oWords, " "));
+}
+
+std::string BashReply(const std::string& words)
+{
+    return fmt::format("COMPREPLY=($(compgen -W \"{}\" -- \"$word\")); return", words);
+}
+
+std::string BashOffer(const CLI::Option& oOption)
+{
+    switch (OfferOf(oOption))
+    {
+    case Offer::eWords:
+        return BashReply(WordsText(oOption));
+    case Offer::eFormats:
+        return BashReply(fmt::format("$({})", LIST_FORMATS));
+    case Offer::eFiles:
+        return "return";
+    default:
+        return "compopt +o default 2>/dev/null; return";
+    }
+}
+
 // What follows an option: its words, a file name, or nothing that could be told.
 std::string BashValues(const CLI::App& oApp, const CLI::App& oVerb)
 {
     std::string cases;
     for (const CLI::Option* const poOption : ListNamed(oApp, &oVerb))
         if (TakesValue(*poOption))
-        {
-            const std::vector<std::string> oWords = GetWordsOf(*poOption);
-            cases += fmt::format("            {}) {} ;;\n", fmt::join(NamesOf(*poOption), "|"),
-                                 oWords.empty() ? "return"
-                                                : fmt::format("COMPREPLY=($(compgen -W \"{}\" -- \"$word\")); return",
-                                                              fmt::join(oWords, " ")));
-        }
+            cases += fmt::format("            {}) {} ;;\n", fmt::join(NamesOf(*poOption), "|"), BashOffer(*poOption));
     return cases.empty() ? "" : "            case \"$before\" in\n" + cases + "            esac\n";
 }
 
@@ -183,10 +231,12 @@ std::string MakeBashCompletion(const CLI::App& oApp)
         "        '') COMPREPLY=($(compgen -W \"$verbs {1}\" -- \"$word\")); return ;;\n"
         "{2}"
         "    esac\n"
-        "    case \"$word\" in -*) COMPREPLY=($(compgen -W \"$options\" -- \"$word\")) ;; esac\n"
+        "    case \"$word\" in -*) COMPREPLY=($(compgen -W \"$options\" -- \"$word\")); return ;; esac\n"
+        "    case \"$verb\" in formats) {3} ;; esac\n"
         "}}\n"
         "complete -o default -F _krv krv\n",
-        fmt::join(oNames, " "), NameList(ListNamed(oApp, nullptr)), verbs);
+        fmt::join(oNames, " "), NameList(ListNamed(oApp, nullptr)), verbs,
+        BashReply(fmt::format("$({})", LIST_FORMATS)));
 }
 
 // Text between the quotes in which zsh describes an option: what would end it, or one of its fields, is escaped.
@@ -205,19 +255,29 @@ std::string ZshText(const std::string& text)
     return result;
 }
 
+std::string ZshOffer(const CLI::Option& oOption)
+{
+    switch (OfferOf(oOption))
+    {
+    case Offer::eWords:
+        return fmt::format(":word:({})", WordsText(oOption));
+    case Offer::eFormats:
+        return ":format:_krv_formats";
+    case Offer::eFiles:
+        return ":file:_files";
+    default:
+        return ":value: ";
+    }
+}
+
 std::string ZshOptions(const CLI::App& oApp, const CLI::App* poVerb)
 {
     std::string text;
     for (const CLI::Option* const poOption : ListNamed(oApp, poVerb))
-    {
-        const std::vector<std::string> oWords = GetWordsOf(*poOption);
         for (const std::string& name : NamesOf(*poOption))
             text += fmt::format(" \\\n                '{}{}[{}]{}'", poOption->get_items_expected_max() > 1 ? "*" : "",
                                 name, ZshText(poOption->get_description()),
-                                !TakesValue(*poOption) ? std::string()
-                                : oWords.empty()       ? ":value:_files"
-                                                       : fmt::format(":word:({})", fmt::join(oWords, " ")));
-    }
+                                TakesValue(*poOption) ? ZshOffer(*poOption) : std::string());
     return text;
 }
 
@@ -227,10 +287,12 @@ std::string MakeZshCompletion(const CLI::App& oApp)
     for (const CLI::App* const poVerb : ListVerbs(oApp))
     {
         verbs += fmt::format("        '{}:{}'\n", poVerb->get_name(), ZshText(poVerb->get_description()));
-        cases += fmt::format("            {})\n            _arguments{} \\\n                '*:file:_files' ;;\n",
-                             poVerb->get_name(), ZshOptions(oApp, poVerb));
+        cases += fmt::format("            {})\n            _arguments{} \\\n                '{}' ;;\n",
+                             poVerb->get_name(), ZshOptions(oApp, poVerb),
+                             poVerb->get_name() == "formats" ? "*:format:_krv_formats" : "*:file:_files");
     }
     return fmt::format("#compdef krv\n# zsh completion of krv, made from its own description\n"
+                       "_krv_formats()\n{{\n    compadd -- $({})\n}}\n"
                        "_krv()\n{{\n"
                        "    local -a verbs=(\n{}    )\n"
                        "    local state\n"
@@ -241,7 +303,7 @@ std::string MakeZshCompletion(const CLI::App& oApp)
                        "    esac\n"
                        "}}\n"
                        "_krv \"$@\"\n",
-                       verbs, ZshOptions(oApp, nullptr), cases);
+                       LIST_FORMATS, verbs, ZshOptions(oApp, nullptr), cases);
 }
 
 } // namespace

@@ -107,10 +107,35 @@ std::string LibraryText(const krv::LibraryException& oError)
                        loader.empty() ? "" : " (" + loader + ")", pRemedy, RegistryPath());
 }
 
+// By which option the member of a request is asked for that is to be another one.
+std::string OptionText(const std::string& field)
+{
+    struct FieldOption
+    {
+        std::string_view field;
+        std::string_view option;
+    };
+    static constexpr FieldOption OPTIONS[] = {{"channels", "--channels"},
+                                              {"coordinates", "--coordinates"},
+                                              {"format", "--format"},
+                                              {"method", "--resampling"},
+                                              {"options", "--options; `krv formats NAME` lists those of a format"},
+                                              {"power", "convert --power"},
+                                              {"scale", "--scale"},
+                                              {"target", "--write, --zone"},
+                                              {"type", "--type"},
+                                              {"unscale", "--unscale"}};
+    const auto* const pOption = std::ranges::find(OPTIONS, std::string_view(field), &FieldOption::field);
+    return pOption == std::end(OPTIONS) ? std::string() : fmt::format(" ({})", pOption->option);
+}
+
 std::string DataText(const krv::Exception& oError, const std::string& file)
 {
     if (oError.GetMessage() == "No format libraries registered successfully")
         return fmt::format("{}: the registry lists no format; reinstall, or list the formats in it", RegistryPath());
+    if (oError.GetMessage() == "Margin behaviour is eException")
+        return WithFile(file, "tiles at the border have margins outside of the image; choose a --behaviour that makes "
+                              "them, or no margins");
     constexpr std::string_view TWICE = "Format already registered: short name=";
     if (oError.GetMessage().starts_with(TWICE))
         return fmt::format("{}: the format {} is listed twice; take one of the two out of the registry", RegistryPath(),
@@ -197,6 +222,11 @@ std::string Describe(const std::string& file, const krv::Exception** ppError)
     catch (const operations::StoppedException& oError)
     {
         return oError.what();
+    }
+    catch (const operations::RequestException& oError)
+    {
+        *ppError = &oError;
+        return oError.what() + OptionText(oError.GetField());
     }
     catch (const krv::Exception& oError)
     {

@@ -1,9 +1,13 @@
 #include "tools/krv/infotext.h"
 
+#include "toolkit/ogc/cs/controlpoints.h"
 #include "tools/krv/errors.h"
 #include "tools/krv/progress.h"
 
 #include <fmt/format.h>
+
+#include <algorithm>
+#include <vector>
 
 namespace krv::tool
 {
@@ -12,6 +16,8 @@ namespace
 {
 
 constexpr std::size_t LONGEST_VALUE = 300;
+constexpr char CONTROL_POINTS[] = "GroundControlPoints";
+constexpr std::size_t SHOWN_POINTS = 5;
 
 // On one line, and not longer than a few lines of a terminal; never cut inside a UTF-8 character.
 std::string Short(const std::string& text)
@@ -43,6 +49,31 @@ std::string MapText(const Json& oMap, const char* pIndent)
     for (const auto& [key, value] : oMap.items())
         text += fmt::format("{}{} = {}\n", pIndent, Short(key), Text(value));
     return text;
+}
+
+// Their number and the first of them as a table.
+std::string PointsText(const std::vector<krv::ogc::cs::ControlPoint>& oPoints)
+{
+    std::string text = fmt::format("  control points: {}\n    {:>12} {:>12} {:>18} {:>18} {:>12}\n", oPoints.size(),
+                                   "column", "row", "x", "y", "z");
+    for (std::size_t i = 0; i < std::min(oPoints.size(), SHOWN_POINTS); ++i)
+        text += fmt::format("    {:>12} {:>12} {:>18} {:>18} {:>12}\n", oPoints[i].column, oPoints[i].row, oPoints[i].x,
+                            oPoints[i].y, oPoints[i].z);
+    return oPoints.size() > SHOWN_POINTS
+               ? text + fmt::format("    ... and {} more; --json has all\n", oPoints.size() - SHOWN_POINTS)
+               : text;
+}
+
+std::string MetadataText(const Json& oInfo)
+{
+    Json oTags = oInfo["metadata"];
+    std::vector<krv::ogc::cs::ControlPoint> oPoints;
+    if (const auto oFound = oTags.find(CONTROL_POINTS); oFound != oTags.end() && oFound->is_string())
+        oPoints = krv::ogc::cs::ParseControlPoints(oFound->get<std::string>());
+    if (!oPoints.empty())
+        oTags.erase(CONTROL_POINTS);
+    return (oPoints.empty() ? "" : PointsText(oPoints)) +
+           (oTags.empty() ? "" : "  metadata\n" + MapText(oTags, "    "));
 }
 
 std::string GeocodingText(const Json& oTerms)
@@ -211,9 +242,7 @@ std::string InfoText(const Json& oInfo)
     text += "  channels\n";
     for (const Json& oChannel : oInfo["channels"])
         text += ChannelText(oChannel);
-    if (!oInfo["metadata"].empty())
-        text += "  metadata\n" + MapText(oInfo["metadata"], "    ");
-    return text;
+    return text + MetadataText(oInfo);
 }
 
 } // namespace krv::tool

@@ -13,7 +13,7 @@ namespace
 // Less than what string instructions are used for, which clear past the nearest cache.
 constexpr std::ptrdiff_t CLEARED_AHEAD = 1024;
 
-// Between a word whose highest bit is the first and eight bytes whose highest bits are.
+// Turns a word whose highest bit is the first into eight bytes whose highest bits are, and back.
 std::uint64_t InByteOrder(std::uint64_t nWord)
 {
     return std::endian::native == std::endian::little ? __builtin_bswap64(nWord) : nWord;

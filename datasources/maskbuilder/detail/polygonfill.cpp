@@ -163,7 +163,7 @@ public:
     }
 
 private:
-    // From a row on, to the end of the edge or of the block.
+    // Goes from a row to the end of the edge or of the block.
     bool PlaceFrom(std::size_t nFirst, const Edge& oEdge)
     {
         const auto nEnd = static_cast<std::size_t>(

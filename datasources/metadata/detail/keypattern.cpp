@@ -29,7 +29,7 @@ bool IsSeparator(char cByte)
     return cByte == '\n' || cByte == '\r' || cByte == '\f';
 }
 
-// Without an early end, which lets the compiler take many bytes at once: keys are short.
+// The loop has no early end, which lets the compiler take many bytes at once: keys are short.
 bool IsOneLine(std::string_view key)
 {
     unsigned int nSeparators = 0;

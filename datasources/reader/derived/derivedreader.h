@@ -17,8 +17,7 @@ class ReaderValidity;
 // source's answer until a derived class overrides it: type, channels and record where they differ. A derived class says
 // in any case how a raster is filled, by ReadRaster, and how a reader of a level is wrapped. One thread at a time.
 // A program that shows pixels otherwise (a filter, an index of two channels) derives from this;
-// docs/readers-over-readers.md
-// tells what else to think of.
+// docs/readers-over-readers.md tells what else to think of.
 class KRV_DATASOURCES_API DerivedReader : public TiledReader, public IDatasetAccess, public IValidityReader
 {
 public:

@@ -23,7 +23,7 @@ namespace
 
 using krv::gobs::PCT;
 
-// Without a number the first table.
+// The first table where there is no number.
 std::unique_ptr<PCT> TakeTable(IDataset* poDataset, unsigned int nNumber)
 {
     auto* const poTables = dynamic_cast<IPCTDataset*>(poDataset);

@@ -177,7 +177,7 @@ public:
             });
     }
 
-    // Over the front itself, for rasters that reach outside; null without exact margins.
+    // Stands on the front itself, for rasters that reach outside; null without exact margins.
     ExactHaloReader* GetBordered(RasterCache& oReader)
     {
         if (moImage.mpoCore->moOptions.mbExactMargins && mpoBordered == nullptr)

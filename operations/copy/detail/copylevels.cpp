@@ -84,7 +84,7 @@ public:
         return oBlocks;
     }
 
-    // Of the pixels in a block.
+    // The bytes of the pixels in a block.
     std::uint64_t GetPixelBytes(const BlockNumber& oBlock) const
     {
         const PixelWindow oPart = GetPart(moForm, oBlock);
@@ -235,7 +235,7 @@ private:
             }
             return poBlocks->SetEncodedForm(nLevel, oNew);
         };
-        // Of some formats all blocks are whole in one size of a level, and end with it in another.
+        // Some formats have whole blocks in one size of a level, and blocks that end with it in another.
         return Set(oForm.mbWholeBlocks) || (oForm.mbWholeBlocks && Set(false));
     }
 

@@ -73,8 +73,9 @@ void CopyPlan::ChooseChannels(const std::vector<unsigned int>& oWanted)
     {
         if (nChannel == 0 || nChannel > oAll.size())
             throw RequestException(fmt::format("{}: there is no channel {}; the channels are 1 to {}",
-                                               moSources.size() == 1 ? moSources.front()->GetName() : "--channels",
-                                               nChannel, oAll.size()));
+                                               moSources.size() == 1 ? moSources.front()->GetName() : "all files",
+                                               nChannel, oAll.size()),
+                                   "channels");
         moChannels.push_back(oAll[nChannel - 1]);
     }
     if (oWanted.empty())

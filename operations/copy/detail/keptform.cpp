@@ -137,7 +137,7 @@ std::vector<KeptOption> FindKeptOptions(const CopyPlan& oPlan, const std::string
                                     : fmt::format("strips of {} rows", oForm->mnBlockHeight),
                              blocks, ""});
     }
-    // Of channels of several types each has the predictor that goes with it.
+    // Each channel of several types has the predictor that goes with it.
     const auto& oTypes = oPlan.GetTypes();
     const bool bMixed = std::adjacent_find(oTypes.begin(), oTypes.end(), std::not_equal_to<>()) != oTypes.end();
     // JPEG has no narrow samples, differences of values neither.

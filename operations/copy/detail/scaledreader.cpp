@@ -36,7 +36,7 @@ struct Limits
     double high;
 };
 
-// Of a type; 0 and 1 of reals, whose values have no natural end.
+// The limits of a type; 0 and 1 for reals, whose values have no natural end.
 Limits LimitsOf(const krv::gobs::DataType& oType)
 {
     return krv::gobs::VisitPartType(oType,
@@ -54,7 +54,7 @@ ValueScale LineOf(const std::vector<double>& oScale, const Limits& oTo)
 {
     const double nScale = (oTo.high - oTo.low) / (oScale[1] - oScale[0]);
     if (!std::isfinite(nScale) || nScale == 0)
-        throw RequestException("--scale: the two numbers of each pair are to differ");
+        throw RequestException("the two numbers of each pair are to differ", "scale");
     return {nScale, oTo.low - oScale[0] * nScale};
 }
 

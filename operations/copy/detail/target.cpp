@@ -47,17 +47,18 @@ std::string ChooseFormat(const TargetForm& oForm)
         all += (all.empty() ? "" : ", ") + poFormat->GetShortName();
     }
     if (!bKnown)
-        throw RequestException(fmt::format("--format: there is no format {}; there are {}", oForm.format, all));
+        throw RequestException(fmt::format("there is no format {}; there are {}", oForm.format, all), "format");
     if (oForm.format.empty() && format.empty())
-        throw RequestException(fmt::format(
-            "{}: no format has the extension {}; name the file otherwise, or choose with "
-            "--format among {}{}",
-            oForm.name, extension, all, EqualNames(extension, ".png") ? " (`krv view` makes pictures)" : ""));
+        throw RequestException(fmt::format("{}: no format has the extension {}; name the file otherwise, or choose one "
+                                           "of the formats {}{}",
+                                           oForm.name, extension, all,
+                                           EqualNames(extension, ".png") ? "; pictures are made by quick looks" : ""),
+                               "format");
     if (!oForm.format.empty())
         format = krv::ToUpper(oForm.format);
     if (!oManager.GetCapabilities(format).IsSupported(CAPABILITY_CREATE))
-        throw RequestException(
-            fmt::format("{}: the format {} cannot create files; choose another with --format", oForm.name, format));
+        throw RequestException(fmt::format("{}: the format {} cannot create files; choose another", oForm.name, format),
+                               "format");
     return format;
 }
 
@@ -142,11 +143,10 @@ void Target::MakeByUser(const TargetForm& oForm, const std::string& options)
     catch (const krv::DataException& oError)
     {
         if (bMixed)
-            throw RequestException(oError.GetMessage() + " (--type gives all channels one type)");
+            throw RequestException(oError.GetMessage() + "; give all channels one type", "type");
         if (oForm.options.empty())
             throw;
-        throw RequestException(
-            fmt::format("--options: {} (`krv formats {}` lists all)", oError.GetMessage(), moFormat));
+        throw RequestException(oError.GetMessage(), "options");
     }
 }
 

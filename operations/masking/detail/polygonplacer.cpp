@@ -69,25 +69,27 @@ PolygonPlacer::PolygonPlacer(const SourceFile& oFile, const MaskRequest& oReques
         crs = oText.crs.empty() ? "EPSG:4326" : oText.crs;
     }
     if (!oText.crs.empty() && eMeaning == PolygonCoordinates::eMap)
-        throw RequestException(
-            "--polygon: --coordinates map means the file's own reference system, but the polygon names " + oText.crs +
-            "; leave one of them out");
+        throw RequestException("map coordinates are those of the file's own reference system, but the polygon names " +
+                                   oText.crs + "; leave one of them out",
+                               "coordinates");
     if (!oText.crs.empty() && eMeaning == PolygonCoordinates::ePixels)
-        throw RequestException("--polygon: pixels have no reference system, but the polygon names " + oText.crs +
-                               "; leave that out or --coordinates pixel");
+        throw RequestException("pixels have no reference system, but the polygon names " + oText.crs +
+                                   "; leave one of them out",
+                               "coordinates");
     if (eMeaning == PolygonCoordinates::ePixels)
         return;
     const auto* const poGeocoded = dynamic_cast<krv::datasources::IGeocodedDataset*>(&oFile.GetDataset());
     if (poGeocoded == nullptr || poGeocoded->GetGeocoding().IsIdentity() || !poGeocoded->GetGeocoding().IsInvertible())
-        throw krv::DataException(oFile.GetName() + ": the file is not georeferenced; give polygons in pixels, with "
-                                                   "--coordinates pixel");
+        throw RequestException(oFile.GetName() + ": the file is not georeferenced; give polygons in pixels",
+                               "coordinates");
     moGeocoding = poGeocoded->GetGeocoding();
     if (eMeaning != PolygonCoordinates::eNamedMap)
         return;
     const std::unique_ptr<krv::ogc::cs::ICRS> poTarget(oFile.GetDataset().ReadCRS());
     if (poTarget == nullptr)
-        throw krv::DataException(oFile.GetName() + ": the file names no reference system; give polygons in its own "
-                                                   "map units, with --coordinates map");
+        throw RequestException(oFile.GetName() +
+                                   ": the file names no reference system; give polygons in its own map units",
+                               "coordinates");
     const auto poSource = ParseReferenceSystem(crs);
     moTransformation.emplace(*poSource, *poTarget);
     mnSourceTurn = TurnOf(*poSource);

@@ -22,8 +22,8 @@ class PolygonPlacer
 public:
     using Ring = std::vector<GDBVertex>;
 
-    // oFile must outlive the object. Throws RequestException when text and request contradict each other and
-    // krv::DataException when the file cannot place such polygons.
+    // oFile must outlive the object. Throws RequestException when text and request contradict each other or the file
+    // cannot place such polygons.
     PolygonPlacer(const SourceFile& oFile, const MaskRequest& oRequest, const PolygonText& oText);
 
     // The polygon in continuous pixels: mostly one shape, none when it lies elsewhere, and several, whose union counts,

@@ -15,7 +15,7 @@ namespace krv::plugins::gdball
 namespace
 {
 
-// Beside the library that holds this code, whatever links lead there.
+// The module lies beside the library that holds this code, whatever links lead there.
 std::string FindLibrary()
 {
     Dl_info oInfo = {};

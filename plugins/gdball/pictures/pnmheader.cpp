@@ -42,7 +42,7 @@ std::uint64_t PnmHeader::CountPixelBytes() const
     if (mnKind == '4')
         return (mnWidth + 7) / 8 * mnHeight;
     const bool bWide = !IsReal() && !IsBits() && ParseNumber<std::uint32_t>(moMaximum).value_or(0) > 255;
-    // Of text a digit for each sample, and blanks between those that are no single bits.
+    // Text has a digit for each sample, and blanks between those that are no single bits.
     const std::uint64_t nEach = IsReal() ? 4 : IsText() ? (IsBits() ? 1 : 2) : bWide ? 2 : 1;
     const std::uint64_t nSamples = mnWidth * mnHeight;
     return nSamples / GetChannels() > MOST / 16 / GetChannels()

@@ -114,7 +114,7 @@ void Link::Open(const Place& oPlace)
             if (!poDataset)
                 throw DataException("it cannot be opened");
         });
-    // Before anything of it is asked that would open what it leads to.
+    // This comes before anything is asked that would open what the link leads to.
     for (const std::string& file : krv::datasources::FollowLinks(*poDataset, moOwner, oPlace))
         if (const auto oState = ReadState(file); oState && moState)
         {

@@ -111,7 +111,7 @@ const unsigned char* TileCodec::PackBits(const unsigned char* pSource, std::size
     return bAny ? pPacked : nullptr;
 }
 
-// Into rows of all stored channels; those that are not there become 0.
+// Spreads samples into rows of all stored channels; those that are not there become 0.
 const unsigned char* TileCodec::Spread(const unsigned char* pSource, std::size_t nPitch, std::size_t nWidth,
                                        std::size_t nRows)
 {

@@ -401,8 +401,8 @@ void StoreWriter::Commit()
 }
 
 // What was written is on the disk before the one root that makes it the file's, and that before anything of the former
-// state is given up. Of a root that may not have reached the disk nobody knows what is there: the next one goes into
-// the same slot under another number, so that the last good one stays.
+// state is given up. Nobody knows what is on the disk of a root that may not have reached it: the next one goes
+// into the same slot under another number, so that the last good one stays.
 void StoreWriter::Publish(const Root& oRoot)
 {
     mnCommittedSize = GetFile()->GetSize();

@@ -122,7 +122,7 @@ int RenameToFree(const char* pFrom, const char* pTo)
         return ::unlink(pFrom) == 0 ? 0 : errno;
     if (!IsUnknownCall(errno))
         return errno;
-    // Without either of them an empty file takes the name first.
+    // An empty file takes the name first where there is neither of them.
     const int nTaken = ::open(pTo, O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0666);
     if (nTaken < 0)
         return errno;

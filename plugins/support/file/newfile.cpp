@@ -44,6 +44,21 @@ std::string MakeCheckedName(const std::string& fileName, bool bReplace, const Pl
     return MakeTemporaryName(fileName);
 }
 
+// Some folders say that they can be written and take no file: what a user reads names the file that was asked for.
+std::shared_ptr<File> MakeFile(const std::string& temporary, const std::string& fileName, const Place& oPlace)
+{
+    try
+    {
+        return std::make_shared<File>(temporary, File::Mode::eCreate, oPlace);
+    }
+    catch (const krv::FileException& oError)
+    {
+        const std::string& message = oError.GetMessage();
+        throw IOException(fileName, fileName + ": cannot be created: " + message.substr(message.rfind(": ") + 2),
+                          oPlace);
+    }
+}
+
 } // namespace
 
 // The name is of no length that a folder does not take.
@@ -58,7 +73,7 @@ std::string MakeTemporaryName(const std::string& fileName)
 
 NewFile::NewFile(const std::string& fileName, bool bReplaces, const Place& oPlace)
     : moFileName(fileName), moTemporary(MakeCheckedName(fileName, bReplaces, oPlace)),
-      mpoFile(std::make_shared<File>(moTemporary, File::Mode::eCreate, oPlace))
+      mpoFile(MakeFile(moTemporary, fileName, oPlace))
 {
     mpoFile->ShowAs(fileName);
 }

@@ -37,8 +37,8 @@ public:
     }
 
 private:
-    std::unique_ptr<unsigned char[]> mpoBytes;
-    std::size_t mnBytes = 0;
+    std::unique_ptr<unsigned char[]> mpoBytes; // not cleared
+    std::size_t mnBytes = 0;                   // that there are
 };
 
 } // namespace krv::plugins::support

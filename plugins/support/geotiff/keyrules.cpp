@@ -71,7 +71,7 @@ constexpr ParameterKeys PARAMETERS[] = {
     {8813, {ProjAzimuthAngleGeoKey}, 90.0, CT_ObliqueMercator_Rosenmund},
     {8813, {ProjAzimuthAngleGeoKey}},
     {8814, {ProjRectifiedGridAngleGeoKey}, 90.0, CT_ObliqueMercator_Rosenmund},
-    // Without an angle of its own the grid is turned back by the azimuth, so that it points north at the centre.
+    // The grid is turned back by the azimuth where it has no angle of its own, so that it points north at the centre.
     {8814, {ProjRectifiedGridAngleGeoKey, ProjAzimuthAngleGeoKey}},
     {8815, {ProjScaleAtCenterGeoKey, ProjScaleAtNatOriginGeoKey}, 1.0},
     {8816, {ProjCenterEastingGeoKey, ProjFalseEastingGeoKey, ProjFalseOriginEastingGeoKey}},

@@ -96,7 +96,7 @@ struct BlockImage::Range
 };
 
 // Decoded pixels of one plane: pointer to the first one of a part, and the bytes from row to row; where they lie in the
-// store, with the hold on them. Of a block that another thread is decoding there are none.
+// store, with the hold on them. A block that another thread is decoding has none.
 struct BlockImage::Pixels
 {
     const unsigned char* mpFirst = nullptr;

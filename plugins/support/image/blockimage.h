@@ -80,8 +80,7 @@ public:
 
     // A rectangle inside the image; row r goes to pTarget + r * nPitch.
     // Pixels are interleaved in the order of the selection; bytes between rows stay untouched. Throws what the source
-    // throws, the
-    // target's contents undefined.
+    // throws, the target's contents undefined.
     void Read(const ChannelSelection& oChannels, const PixelRect& oRect, unsigned char* pTarget, std::size_t nPitch);
 
     // Parts of blocks are passed on as such: whether blocks are read for that is the source's affair. pSource is not

@@ -82,8 +82,8 @@ private:
     void Fill(const BlockAddress& oBlock, unsigned char* pTarget);
     krv::cache::TileHold Publish(const BlockAddress& oBlock, const PixelRect& oPart, krv::cache::TileClaim& oClaim);
 
-    IBlockSource& moSource; // borrowed
-    const ImageLayout& moLayout;
+    IBlockSource& moSource;                          // borrowed
+    const ImageLayout& moLayout;                     // the source's
     std::shared_ptr<const File> mpoFile;             // null: not shared
     std::unique_ptr<krv::cache::TileOwner> mpoOwner; // never null
 };

@@ -30,6 +30,7 @@ public:
         return IsOrdered() ? BlockTiles::Border{0, 0, mnRows} : BlockTiles::Border{mnColumns, mnRows, mnRows};
     }
     // Whether the window that was noted last goes on along a row of windows.
+    // Blocks ahead of it are worth fetching then.
     bool IsPassing() const { return mnWindows > 1; }
 
     // Notes a window. oDone(column, row, rows): called for each block that is done with, but for so many rows at its
@@ -106,17 +107,17 @@ private:
             }
     }
 
-    const ImageLayout& moLayout;
-    unsigned int mnLag;
-    PixelRect moLast{};
-    unsigned int mnWindows = 0; // in this row of windows
-    bool mbOrdered = false;     // these come from left to right
-    bool mbLastOrdered = false; // those of the row before did
-    unsigned int mnLeft = 0;    // columns of blocks that are done with in it
-    unsigned int mnStep = 0;    // from one row of windows to the next; 0: not known yet
+    const ImageLayout& moLayout; // borrowed
+    unsigned int mnLag;          // windows that readers in turn may be behind, in blocks
+    PixelRect moLast{};          // the window that was noted last
+    unsigned int mnWindows = 0;  // in this row of windows
+    bool mbOrdered = false;      // these come from left to right
+    bool mbLastOrdered = false;  // those of the row before did
+    unsigned int mnLeft = 0;     // columns of blocks that are done with in it
+    unsigned int mnStep = 0;     // from one row of windows to the next; 0: not known yet
     // How far windows reach into the blocks around their own.
     unsigned int mnColumns = 0;
-    unsigned int mnRows = 0;
+    unsigned int mnRows = 0; // see mnColumns
 };
 
 } // namespace krv::plugins::support

@@ -32,10 +32,10 @@ private:
     void WritePixels(const PixelRect& oRect, const unsigned char* pSource, std::size_t nPitch) override;
 
     std::shared_ptr<BlockImage> mpoImage; // shared with the dataset
-    ChannelSelection moChannels;
+    ChannelSelection moChannels;          // that its pixels consist of
     // What readers are told to use: the layout's, but never more than 64 MiB for all channels together.
     unsigned int mnTileWidth;
-    unsigned int mnTileHeight;
+    unsigned int mnTileHeight; // pixels, as the width
 };
 
 extern template class BlockRasterIO<krv::datasources::IRasterIO>;

@@ -87,14 +87,14 @@ public:
 private:
     struct Key
     {
-        Description moDescription;
+        Description moDescription;                            // as users are told
         std::function<bool(const std::string& value)> moTake; // false for what it does not take
-        bool mbGiven = false;
+        bool mbGiven = false;                                 // the text that was parsed has it
     };
 
     std::string ListKeys() const;
 
-    std::vector<Key> moKeys;
+    std::vector<Key> moKeys; // in the order in which they were added
 };
 
 } // namespace krv::plugins::support

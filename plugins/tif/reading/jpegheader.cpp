@@ -136,7 +136,7 @@ JpegHeader JpegHeader::Read(Bytes oStream)
     for (std::size_t nAt = 0; nAt + 1 < oStream.size();)
     {
         const unsigned char nMarker = oStream[nAt + 1];
-        // Between segments decoders pass over what is no marker.
+        // Decoders pass over what is no marker between segments.
         if (oStream[nAt] != MARKER || nMarker == 0 || nMarker == MARKER)
         {
             ++nAt;

@@ -402,7 +402,7 @@ void FileEditor::Commit(const std::vector<Written>& oWritten)
         mpoSpace->Reuse(IsNamed() ? GetFile()->FindHeld() : support::Space::Roots(std::in_place));
 }
 
-// Before the first change becomes the file's, its own text says that what it promised does not hold any more.
+// The file's own text says that what it promised does not hold any more, before the first change becomes the file's.
 void FileEditor::MarkChanged()
 {
     if (mnCloudBytes == 0 || mbMarked)

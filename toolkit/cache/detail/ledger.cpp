@@ -71,7 +71,7 @@ std::size_t Ledger::GetMostKept() const noexcept
     return static_cast<std::size_t>(std::min(nBudget / 2, nBudget - std::min(nBytes, nBudget)));
 }
 
-// From the next tile on there is room for as many.
+// There is room for as many from the next tile on.
 void Ledger::NoteRefused(std::size_t nBytes) noexcept
 {
     const std::uint64_t nWanted = std::min<std::uint64_t>(HKeptBytes() + nBytes, GetBudget() / 8);

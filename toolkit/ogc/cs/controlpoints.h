@@ -43,8 +43,7 @@ public:
     PolynomialFit(const std::vector<ControlPoint>& oPoints, unsigned int nDegree, Direction eDirection);
 
     // eRasterToMap: column and row to x and y; eMapToRaster: the other way. Any numbers are taken, those far outside of
-    // the
-    // points as well, where a polynomial means little. Results may replace the arguments.
+    // the points as well, where a polynomial means little. Results may replace the arguments.
     void Map(double nFirst, double nSecond, double& nFirstResult, double& nSecondResult) const;
 
     // How far the points lie from where they should, in the unit of the result: the root of the mean square distance,

@@ -15,8 +15,7 @@ namespace krv::ogc::cs
 
 // The system of an EPSG code.
 // Example: CreateCRSFromEPSG(32633)->GetName() is "WGS 84 / UTM zone 33N". The first call of a process opens the
-// database
-// and takes some milliseconds, others much less.
+// database and takes some milliseconds, others much less.
 KRV_TOOLKIT_API std::unique_ptr<ICRS> CreateCRSFromEPSG(int nCode, const Place& oPlace = Place::Current());
 
 // The system of a definition: WKT1 (both common dialects), WKT2, PROJJSON or "EPSG:n"; white space around it is

@@ -23,8 +23,7 @@ public:
                   double nYPerRow);
 
     // The two offsets are the map coordinates of the outer corner of the first pixel, in map units; the other terms are
-    // map
-    // units for one pixel. North-up images have a negative YPerRow.
+    // map units for one pixel. North-up images have a negative YPerRow.
     double GetXOffset() const { return moTerms[0]; }
     double GetXPerColumn() const { return moTerms[1]; }
     double GetXPerRow() const { return moTerms[2]; }

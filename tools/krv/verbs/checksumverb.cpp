@@ -31,9 +31,8 @@ int RunChecksum(Selection& oSelection, const Options& oOptions)
     const auto oChannels = ParseNumbers(oOptions.channels, "--channels");
     Json oFiles = Json::array();
     std::string text;
-    for (const std::string& file : oOptions.files)
+    const auto Sum = [&](const std::string& file)
     {
-        oSelection.file = file;
         const auto oSums = operations::ComputeChecksums(operations::SourceFile(file), oChannels, oOptions.level,
                                                         ShowProgress(), GetExecutor());
         Json oRows = Json::array();
@@ -45,9 +44,10 @@ int RunChecksum(Selection& oSelection, const Options& oOptions)
             text += fmt::format("{:>4}  {:<5} {}\n", oSum.number, type, crc);
         }
         oFiles.push_back({{"file", file}, {"width", oSums.width}, {"height", oSums.height}, {"channels", oRows}});
-    }
+    };
+    const int nCode = ForEachFile(oSelection, oOptions.files, Sum);
     Print(!oOptions.json ? text : oOptions.files.size() == 1 ? ToText(oFiles.front()) : ToText({{"files", oFiles}}));
-    return 0;
+    return nCode;
 }
 
 } // namespace

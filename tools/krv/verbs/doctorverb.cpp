@@ -5,6 +5,7 @@
 
 #include <CLI/CLI.hpp>
 #include <fmt/format.h>
+#include <fmt/ranges.h>
 
 #include <algorithm>
 #include <memory>
@@ -17,12 +18,30 @@ using namespace krv::operations;
 namespace
 {
 
+// What to do, with the words of this command where it can do it.
+std::string RemedyText(const Finding& oFinding)
+{
+    switch (oFinding.step)
+    {
+    case RemedyStep::eBuildLevels:
+        return fmt::format("{}: krv overviews FILE --levels {}", oFinding.remedy, fmt::join(oFinding.levels, ","));
+    case RemedyStep::eLinkAnew:
+        return oFinding.remedy + ": krv link TARGET SOURCE";
+    case RemedyStep::eConvert:
+        return oFinding.remedy + "; `krv formats` lists the installed formats";
+    case RemedyStep::eCloudCopy:
+        return oFinding.remedy + ": krv convert IN OUT.tif --options \"LAYOUT=COG COMPRESS=DEFLATE\"";
+    default:
+        return oFinding.remedy;
+    }
+}
+
 std::string FindingText(const Finding& oFinding)
 {
     std::string text = fmt::format("{}  {}: {}\n", oFinding.good ? "ok  " : "BAD ", OneLine(oFinding.subject),
                                    OneLine(oFinding.found));
     if (!oFinding.remedy.empty())
-        text += fmt::format("      what to do: {}\n", oFinding.remedy);
+        text += fmt::format("      what to do: {}\n", RemedyText(oFinding));
     return text;
 }
 
@@ -31,7 +50,7 @@ Json FindingToJson(const Finding& oFinding)
     return {{"ok", oFinding.good},
             {"subject", oFinding.subject},
             {"found", OneLine(oFinding.found)},
-            {"remedy", TextOrNull(oFinding.remedy)}};
+            {"remedy", TextOrNull(RemedyText(oFinding))}};
 }
 
 std::vector<Finding> Find(const std::string& file, bool bCog)

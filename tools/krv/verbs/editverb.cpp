@@ -145,9 +145,8 @@ int RunEdit(Selection& oSelection, const Options& oOptions)
         throw UsageError("edit: say what is to change; `krv edit --help` lists it");
     Json oRows = Json::array();
     std::string text;
-    for (const std::string& file : oOptions.files)
+    const auto Edit = [&](const std::string& file)
     {
-        oSelection.file = file;
         const EditResult oResult = EditFile(file, oRequest);
         oRows.push_back({{"file", file}, {"changed", oResult.changed}});
         text += fmt::format("{}: {}\n", file,
@@ -155,9 +154,10 @@ int RunEdit(Selection& oSelection, const Options& oOptions)
                                                     : fmt::format("changed {}", fmt::join(oResult.changed, ", ")));
         if (oResult.levels)
             text += file + ": its levels were made by the old no-data value; build them anew with krv overviews\n";
-    }
+    };
+    const int nCode = ForEachFile(oSelection, oOptions.files, Edit);
     Print(oOptions.json ? ToText({{"files", oRows}}) : text);
-    return 0;
+    return nCode;
 }
 
 } // namespace

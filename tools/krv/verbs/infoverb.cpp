@@ -19,15 +19,15 @@ int RunInfo(Selection& oSelection, const std::vector<std::string>& oNames, bool 
 {
     Json oFiles = Json::array();
     std::string text;
-    for (const std::string& file : oNames)
+    const auto Gather = [&](const std::string& file)
     {
-        oSelection.file = file;
         const SourceFile oFile(file);
         oFiles.push_back(InfoToJson(GatherInfo(oFile)));
         text += InfoText(oFiles.back());
-    }
-    Print(!bJson ? text : oFiles.size() == 1 ? ToText(oFiles.front()) : ToText({{"files", oFiles}}));
-    return 0;
+    };
+    const int nCode = ForEachFile(oSelection, oNames, Gather);
+    Print(!bJson ? text : oNames.size() == 1 ? ToText(oFiles.front()) : ToText({{"files", oFiles}}));
+    return nCode;
 }
 
 } // namespace

@@ -148,9 +148,8 @@ int RunStats(Selection& oSelection, Options& oOptions)
         oRequest.bins = USUAL_BINS;
     Json oFiles = Json::array();
     std::string text;
-    for (const std::string& file : oOptions.files)
+    const auto Count = [&](const std::string& file)
     {
-        oSelection.file = file;
         const operations::SourceFile oFile(file, eReadOnly, GivenOrNone(oOptions.noData));
         Json oRows = Json::array();
         for (const auto& oStatistics : operations::ComputeStatistics(oFile, oRequest, ShowProgress(), GetExecutor()))
@@ -164,9 +163,10 @@ int RunStats(Selection& oSelection, Options& oOptions)
                           {"height", oFile.GetRaster().GetHeight()},
                           {"channels", oRows},
                           {"version", STATISTICS_VERSION}});
-    }
+    };
+    const int nCode = ForEachFile(oSelection, oOptions.files, Count);
     Print(!oOptions.json ? text : oOptions.files.size() == 1 ? ToText(oFiles.front()) : ToText({{"files", oFiles}}));
-    return 0;
+    return nCode;
 }
 
 } // namespace

@@ -22,8 +22,15 @@ namespace krv::tool
 struct Selection
 {
     std::function<int()> run;
-    std::string file; // the file that errors without a file name are about
+    std::string file;     // the file that errors without a file name are about
+    bool verbose = false; // errors name the place of the throw
 };
+
+// Does the work for each file. One of several that fails is told on the standard error output, and the others are done
+// all the same; the failure of a single one passes, and so does an interruption. Returns the exit code, that of the
+// first failure.
+int ForEachFile(Selection& oSelection, const std::vector<std::string>& oNames,
+                const std::function<void(const std::string& file)>& oWork);
 
 // Each adds one verb to the command: its help, its options and what it does.
 void AddFormatsVerb(CLI::App& oApp, Selection& oSelection);

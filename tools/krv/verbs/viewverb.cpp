@@ -39,7 +39,7 @@ const char* ReasonText(DisplayReason eReason)
     case DisplayReason::eDefaults:
         return "the file's display defaults";
     case DisplayReason::eColourTable:
-        return "it has a colour table";
+        return "the one with a colour table";
     case DisplayReason::eRoles:
         return "described as red, green and blue";
     case DisplayReason::eInks:
@@ -58,7 +58,7 @@ std::string Describe(const SourceFile& oFile, const QuickLook& oLook)
                                    : fmt::format("channel{} {} ({})", oChoice.channels.size() > 1 ? "s" : "",
                                                  fmt::join(oChoice.channels, ", "), ReasonText(oChoice.reason));
     if (oChoice.table != nullptr)
-        return text + ", colour table";
+        return text + ", in the colours of its table";
     text += ", shown from";
     for (std::size_t c = 0; c < oLook.stretches.size(); ++c)
     {

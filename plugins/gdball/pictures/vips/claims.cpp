@@ -138,7 +138,7 @@ public:
     {
     }
 
-    // Of the next byte.
+    // The place of the next byte.
     std::uint64_t GetPlace() const { return mnPlace - (mnHeld - mnUsed); }
 
     // Some of the next bytes, at most so many; none at the end of the file.

@@ -33,7 +33,7 @@ int FindEPSGCode(const PJ* poObject)
     return 0;
 }
 
-// Without what conversion between units left in the last digits.
+// The number without what conversion between units left in its last digits.
 double WithoutNoise(double nValue)
 {
     constexpr int DIGITS = 15;
