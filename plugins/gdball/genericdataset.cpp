@@ -129,7 +129,8 @@ SharedImage::SharedImage(const std::string& fileName, std::unique_ptr<IDataset> 
 {
     if (mpoRaster == nullptr)
         throw DataException(fileName + ": the file holds no image");
-    mpoLevels = std::make_unique<LevelsBeside>(fileName, *mpoRaster, eMode);
+    // Files that are opened by the name of their header have another one.
+    mpoLevels = std::make_unique<LevelsBeside>(mpoImage->GetName(), *mpoRaster, eMode);
     if (eMode == eUpdate && !mpoRaster->GetRasterCapabilities().IsUpdatable())
         mpoBeside = Find<ISidecarWriting>();
     if (mpoBeside != nullptr)

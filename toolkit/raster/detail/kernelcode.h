@@ -406,13 +406,14 @@ inline void SwapSome(const unsigned char* pSource, unsigned char* pTarget)
     std::memcpy(pTarget, aWords, sizeof(aWords));
 }
 
-// In pieces that are loaded whole before they are stored: so the compiler makes vectors of them, in place too. Pieces
-// begin at lines of the cache, since one that lies across two of them costs twice.
+// In pieces that are loaded whole before they are stored: so the compiler makes vectors of them, in place too. Those of
+// long runs begin at lines of the cache, since one that lies across two of them costs twice.
 template <typename TWord>
 void SwapWords(const unsigned char* pSource, unsigned char* pTarget, std::size_t nCount)
 {
     constexpr std::size_t PIECE = 128 / sizeof(TWord);
-    const std::size_t nAhead = -reinterpret_cast<std::uintptr_t>(pTarget) % 64 / sizeof(TWord);
+    constexpr std::size_t LONG = 8192 / sizeof(TWord);
+    const std::size_t nAhead = nCount < LONG ? 0 : -reinterpret_cast<std::uintptr_t>(pTarget) % 64 / sizeof(TWord);
     std::size_t i = 0;
     for (; i < nAhead && i < nCount; ++i)
         SwapSome<TWord, 1>(pSource + i * sizeof(TWord), pTarget + i * sizeof(TWord));
