@@ -37,7 +37,8 @@ unsigned char PackWord(std::uint64_t nWord)
 // Packs whole pairs of words, as far as vectors can; returns the number of words done. The first byte's bit is the
 // highest of its eight:
 //     bytes    b0 b1 .. b7 | b8 .. b15      turned   b7 .. b1 b0 | b15 .. b8      their tops, lowest first
-std::uint64_t PackVectors(const unsigned char* pBytes, std::uint64_t nWords, unsigned char* pBits)
+std::uint64_t PackVectors([[maybe_unused]] const unsigned char* pBytes, [[maybe_unused]] std::uint64_t nWords,
+                          [[maybe_unused]] unsigned char* pBits)
 {
     std::uint64_t i = 0;
 #if defined(KRV_VECTORS)
@@ -78,7 +79,8 @@ constexpr std::array<EightBytes, 256> EXPANSION = MakeExpansion();
 // Expands whole pairs of bytes, as far as vectors can; returns the number of bytes of bits done.
 //     each eight times   b0 b0 b0 b0 b0 b0 b0 b0 | b1 b1 ..
 //     and                80 40 20 10 08 04 02 01 | 80 40 ..      then at most 1
-std::uint64_t ExpandVectors(const unsigned char* pBits, std::uint64_t nBytes, unsigned char* pBytes)
+std::uint64_t ExpandVectors([[maybe_unused]] const unsigned char* pBits, [[maybe_unused]] std::uint64_t nBytes,
+                            [[maybe_unused]] unsigned char* pBytes)
 {
     std::uint64_t i = 0;
 #if defined(KRV_VECTORS)
