@@ -15,14 +15,20 @@ void Report(const Progress& oProgress, const Amount& oAmount)
         throw StoppedException();
 }
 
-void WatchStoring(krv::datasources::IDataset& oDataset, const Progress& oProgress)
+StoringProgress::StoringProgress(krv::datasources::IDataset& oDataset, const Progress& oProgress)
+    : mpoWatched(oProgress ? dynamic_cast<krv::datasources::IWatchedStoring*>(&oDataset) : nullptr)
 {
-    auto* const poWatched = dynamic_cast<krv::datasources::IWatchedStoring*>(&oDataset);
-    if (poWatched != nullptr && oProgress)
-        poWatched->WatchStoring(
+    if (mpoWatched != nullptr)
+        mpoWatched->WatchStoring(
             [oProgress](std::uint64_t nDone, std::uint64_t nTotal) {
                 Report(oProgress, {"store", nDone, nTotal});
             });
+}
+
+StoringProgress::~StoringProgress()
+{
+    if (mpoWatched != nullptr)
+        mpoWatched->WatchStoring({});
 }
 
 ProgressCounter::ProgressCounter(Progress oProgress, const char* pPart, std::uint64_t nTotal)

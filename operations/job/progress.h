@@ -8,7 +8,8 @@
 namespace krv::datasources
 {
 class IDataset;
-}
+class IWatchedStoring;
+} // namespace krv::datasources
 
 namespace krv::operations
 {
@@ -30,8 +31,18 @@ using Progress = std::function<bool(const Amount&)>;
 // For those who write jobs: says how far it is. Throws StoppedException when the function says to stop.
 KRV_OPERATIONS_API void Report(const Progress& oProgress, const Amount& oAmount);
 
-// Has a dataset tell so, as the part "store", while it brings to the disk what was written.
-KRV_OPERATIONS_API void WatchStoring(krv::datasources::IDataset& oDataset, const Progress& oProgress);
+// Has a dataset tell so, as the part "store", while it brings to the disk what was written. Goes before the dataset.
+class KRV_OPERATIONS_API StoringProgress
+{
+public:
+    StoringProgress(krv::datasources::IDataset& oDataset, const Progress& oProgress);
+    ~StoringProgress();
+    StoringProgress(const StoringProgress&) = delete;
+    StoringProgress& operator=(const StoringProgress&) = delete;
+
+private:
+    krv::datasources::IWatchedStoring* mpoWatched; // null where nobody is told
+};
 
 // Reports, counting one part. Of one thread, the one that called the job.
 class KRV_OPERATIONS_API ProgressCounter

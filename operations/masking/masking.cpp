@@ -373,7 +373,7 @@ MaskResult MakeMask(const SourceFile& oFile, const MaskRequest& oRequest, const 
         WritePng(oPicture->Finish(), oRequest.picture, oProgress);
     if (oTarget)
     {
-        WatchStoring(oFile.GetDataset(), oProgress);
+        const StoringProgress oStoring(oFile.GetDataset(), oProgress);
         oTarget->Finish();
         oResult.bitmap = oTarget->GetBitmap();
         oResult.complement = oTarget->IsComplement();

@@ -105,6 +105,7 @@ void Target::Make(const std::string& options)
     // The one before goes first: both have the same name. It was a trial, of which nothing is lost.
     if (Find<INewFileDataset>() != nullptr)
         mpoDataset->Delete();
+    moStoring.reset();
     mpoDataset.reset();
     mpoDataset.reset(DatasetManager::GetInstance()->NewDataset(moName, moFormat, options));
     // A file that another program makes meanwhile is not replaced.
@@ -114,7 +115,7 @@ void Target::Make(const std::string& options)
     if (mpoRaster == nullptr)
         throw krv::DataException(moName + ": the format does not hold images");
     mpoRaster->Create(moLayout.width, moLayout.height, moLayout.types);
-    WatchStoring(*mpoDataset, moProgress);
+    moStoring.emplace(*mpoDataset, moProgress);
 }
 
 bool Target::TryMake(const std::string& options)

@@ -8,6 +8,7 @@
 #include "toolkit/threading/executor.h"
 
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -84,6 +85,7 @@ private:
     bool mbChecked;
     bool mbNew; // nothing had the name before
     std::unique_ptr<krv::datasources::IDataset> mpoDataset;
+    std::optional<StoringProgress> moStoring;
     krv::datasources::IRasterDataset* mpoRaster = nullptr;
     bool mbTakesBlocks = false;
 };

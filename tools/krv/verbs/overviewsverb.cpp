@@ -175,7 +175,7 @@ int RunOverviews(const std::string& file, Options& oOptions)
         };
         Build(oWriter, oLevels, method, oOptions.building);
     }
-    WatchStoring(*poDataset, ShowProgress());
+    const StoringProgress oStoring(*poDataset, ShowProgress());
     poDataset->Synchronize();
     for (const unsigned int nLevel : oLevels)
         Print(fmt::format("level {}: {} x {}\n", nLevel, (nWidth - 1) / nLevel + 1, (nHeight - 1) / nLevel + 1));
