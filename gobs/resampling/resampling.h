@@ -17,7 +17,7 @@ enum class Resampling
     eAverage,  // the mean of the box; of complex values the mean of both parts
     eMode,     // the most frequent value of the box, of several the smallest
     eBilinear, // kernels stretched by f around (i + 0.5) * f - 0.5, of the weights of valid pixels inside the image;
-    eCubic,    // cubic (Keys, -0.5) and lanczos (3 lobes) keep to the range of the pixels that they weigh. Complex
+    eCubic,    // cubic (Keys, -0.5) and lanczos (3 lobes) keep to the range of the pixels that they reach. Complex
     eLanczos,  // values are weighed part by part
     eRms,      // the root of the mean square of the box; of complex values as eAverage of power
     eMin,      // the smallest value of the box, NaN only when there is no other; of complex values that of the

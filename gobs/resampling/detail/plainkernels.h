@@ -19,7 +19,7 @@ struct PlainJob
     const double* mpY;
     std::size_t mnCount;
     unsigned char* mpResult; // interleaved; nothing is written behind the last one
-    bool mbClamp;            // cubic: to the range of the pixels that are weighed
+    bool mbClamp;            // cubic: to the range of the pixels in reach
 };
 
 using PlainLoop = void (*)(const PlainJob& oJob);
@@ -46,7 +46,7 @@ struct RowJob
     const float* mpRowWeights = nullptr;
     std::size_t mnSums = 0;    // samples of a row that are needed
     float* mpSums = nullptr;   // SUM_PADDING more are readable, as behind the following
-    float* mpLowest = nullptr; // null unless results keep to the range of what is weighed
+    float* mpLowest = nullptr; // null unless results keep to the range of what is in reach
     float* mpHighest = nullptr;
 
     const Taps* mpTaps = nullptr; // of the pixels to make

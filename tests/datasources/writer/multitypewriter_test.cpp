@@ -123,6 +123,27 @@ TEST_F(MultiTypeWriterTest, EveryChannelGoesToItsOwnPlaceInItsOwnType)
     }
 }
 
+// Tiles in memory are 256 wide: a window as wide as one lies in one or across two, in few rows or in many.
+TEST_F(MultiTypeWriterTest, WindowsLieAcrossTilesInMemory)
+{
+    MemoryDataset oWide;
+    oWide.Create(600, HEIGHT, TYPES);
+    for (const unsigned int nX : {0u, 40u})
+    {
+        for (const unsigned int nHeight : {20u, 270u})
+        {
+            MultiTypeWriter oWriter(&oWide, {1, 2, 3, 4, 5});
+            const RasterPtr oWindow(oWriter.ReadRaster(nX, 5, 256, nHeight));
+            auto* const p = reinterpret_cast<float*>(oWindow->GetBuffer());
+            for (std::size_t n = 0; n < std::size_t{256} * nHeight * 5; ++n)
+                p[n] = static_cast<float>((n * 7 + n / 101) % 128);
+            oWriter.WriteRaster(oWindow.get());
+            const RasterPtr oBack(oWriter.ReadRaster(nX, 5, 256, nHeight));
+            EXPECT_EQ(PixelsOf(*oBack), PixelsOf(*oWindow)) << nX << " " << nHeight;
+        }
+    }
+}
+
 TEST_F(MultiTypeWriterTest, ChangedSamplesAreCountedOrRefusedBeforeAnythingIsWritten)
 {
     MixedTypes oTypes;
