@@ -12,8 +12,8 @@
 namespace krv::simd
 {
 
-// Sixteen bytes of values of any one width, the first value in the lowest lane: lane i of a width w is bytes i * w to i
-// * w + w - 1 of memory. Signed and unsigned integers share these operations.
+// Sixteen bytes of values of any one width, the first value in the lowest lane: lane i of a width w is bytes i * w to
+// i * w + w - 1 of memory. Signed and unsigned integers share these operations.
 using Vector = __m128i;
 
 // 16 bytes from any address, aligned or not. A whole vector is read: the caller sees to it that 16 bytes are there.
@@ -59,7 +59,8 @@ inline Vector Subtract(Vector oLeft, Vector oRight)
 
 // The low or high halves of two vectors with their values of the width of T in turn.
 // With lanes a0 a1 a2 ... and b0 b1 b2 ...: MixLow gives a0 b0 a1 b1 ... of the lower 8 bytes of both, MixHigh the same
-// of the upper 8. Two planes become one interleaved row by storing MixLow and then MixHigh.
+// of
+// the upper 8. Two planes become one interleaved row by storing MixLow and then MixHigh.
 template <typename T>
 inline Vector MixLow(Vector oFirst, Vector oSecond)
 {
