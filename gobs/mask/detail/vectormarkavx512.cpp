@@ -58,7 +58,7 @@ std::uint64_t EqualBits(__m512i a, __m512i b)
         return _mm512_cmpeq_epi64_mask(a, b);
 }
 
-// A bit for each sample whose lanes are all ones in oNaNs.
+// Of the samples whose lanes are all ones in oNaNs.
 template <class Sample>
 std::uint64_t NaNBits(__m512i a, __m512i oNaNs)
 {
