@@ -212,11 +212,11 @@ inline auto Equal(V a, V b)
 {
     using T = LaneOf<V>;
     if constexpr (std::is_same_v<T, float> && sizeof(V) == 32)
-        return As<std::int32_t>(_mm256_cmp_ps(a, b, _CMP_EQ_OQ));
+        return As<std::int32_t>(static_cast<V>(_mm256_cmp_ps(a, b, _CMP_EQ_OQ)));
     else if constexpr (std::is_same_v<T, float>)
         return As<std::int32_t>(_mm_cmpeq_ps(a, b));
     else if constexpr (std::is_same_v<T, double> && sizeof(V) == 32)
-        return As<std::int64_t>(_mm256_cmp_pd(a, b, _CMP_EQ_OQ));
+        return As<std::int64_t>(static_cast<V>(_mm256_cmp_pd(a, b, _CMP_EQ_OQ)));
     else if constexpr (std::is_same_v<T, double>)
         return As<std::int64_t>(_mm_cmpeq_pd(a, b));
     else
@@ -229,11 +229,11 @@ inline auto NaNs(V o)
 {
     using T = LaneOf<V>;
     if constexpr (std::is_same_v<T, float> && sizeof(V) == 32)
-        return As<std::int32_t>(_mm256_cmp_ps(o, o, _CMP_UNORD_Q));
+        return As<std::int32_t>(static_cast<V>(_mm256_cmp_ps(o, o, _CMP_UNORD_Q)));
     else if constexpr (std::is_same_v<T, float>)
         return As<std::int32_t>(_mm_cmpunord_ps(o, o));
     else if constexpr (sizeof(V) == 32)
-        return As<std::int64_t>(_mm256_cmp_pd(o, o, _CMP_UNORD_Q));
+        return As<std::int64_t>(static_cast<V>(_mm256_cmp_pd(o, o, _CMP_UNORD_Q)));
     else
         return As<std::int64_t>(_mm_cmpunord_pd(o, o));
 }
