@@ -165,7 +165,7 @@ void WarnOfChannelMasks(const SourceFile& oFile, const std::vector<unsigned int>
     if (oChannels.size() > 1 && bInteger && poValidity->HasChannelMasks() && !poValidity->HasNoData())
         detail::Target::Warn(oFile.GetName() +
                              ": where the mask of a channel alone takes its pixels away they become 0, "
-                             "which is not marked; give a --no-data value for them");
+                             "which is not marked; a no-data value would mark them");
 }
 
 void CheckRequest(const WarpRequest& oRequest)
