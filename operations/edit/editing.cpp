@@ -359,7 +359,7 @@ void TellWhatStays(const std::string& file, const EditRequest& oRequest, const N
                    const AuxiliaryData& oBefore, std::set<std::string>& oTags, std::set<std::string>& oPlaced)
 {
     const SourceFile oNow(file);
-    const AuxiliaryData oRecord = oNow.GetMetadata();
+    const AuxiliaryData& oRecord = oNow.GetMetadata();
     const auto Tell = [&file](const std::string& what)
     {
         krv::nspio::Warning::Warn(fmt::format("{}: {} stays: the file says it by other means than a tag of its own, or "
