@@ -17,6 +17,9 @@ public:
     // krv::IOException otherwise, leaves the other file as it is, and may be tried again. Unless this is called a new
     // file replaces one of its name. Does nothing for a file that has its name.
     virtual void KeepExisting() = 0;
+    // Whether the file will give the very pixels that were written. False where they are encoded with loss: a no-data
+    // value says nothing of validity then, and a mask does. Throws DataException before the image is laid out.
+    virtual bool KeepsPixels() const = 0;
 };
 
 } // namespace krv::datasources

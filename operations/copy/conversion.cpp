@@ -321,8 +321,8 @@ void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progres
     // What a codec changes says nothing of validity any more: a mask does.
     const bool bPixelsChange = oTarget.IsLossy() && !oTarget.TakesBlocks();
     const bool bMask = bPixelsChange && HasValidityInValues(oPlan);
-    if (bMask && oTarget.Find<IBitmapDataset>() == nullptr)
-        WriteValidity(oPlan, oTarget, 0);
+    if (bMask)
+        CheckLossyValidity(oTarget);
     const TableNumbers oTables = CopyTables(oPlan, oTarget);
     CopyGeography(oPlan, oTarget);
     AuxiliaryData oRecord = MakeRecord(oPlan, oForm.name, oTables, bPixelsChange, bMask);
@@ -335,11 +335,7 @@ void Convert(const CopyRequest& oRequest, const TargetForm& oForm, const Progres
         CopyChannels(oPlan, oTarget);
     const BitmapNumbers oBitmaps = CopyBitmaps(oPlan, oTarget);
     if (bMask)
-    {
-        Target::Warn(oForm.name +
-                     ": no-data values are not kept: pixels change when they are encoded; a mask says which are valid");
         WriteValidity(oPlan, oTarget, FindValidityMask(*oTarget.Find<IBitmapDataset>()));
-    }
     // LAYOUT=COG means the same to every format: a file laid out for reading over a network has its levels.
     const auto oOptions = ParseOptions(oForm.options);
     const auto oLayout = oOptions.find("LAYOUT");

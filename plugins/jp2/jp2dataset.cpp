@@ -127,6 +127,12 @@ void Jp2Dataset::KeepBeside(const std::function<void(support::AuxXml&)>& oAdd) c
     GetSidecars().SetAuxXml(std::move(oAuxXml));
 }
 
+bool Jp2Dataset::KeepsPixels() const
+{
+    GetImage();
+    return mpoWriter ? mpoWriter->IsLossless() : mpoStream->GetCoding(0).mbReversible;
+}
+
 void Jp2Dataset::WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData)
 {
     CheckWriting("metadata cannot be written", Place::Current());

@@ -43,6 +43,7 @@ public:
     // Throws DataException for types that differ or that JPEG 2000 does not hold.
     void Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes) override;
     using support::Dataset::Create;
+    bool KeepsPixels() const override;
     krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
     void WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override;
     void UpdateCRS(const krv::ogc::cs::ICRS& oCRS) const override;

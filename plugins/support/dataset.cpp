@@ -109,6 +109,12 @@ void Dataset::WatchStoring(Watch oWatch)
         mpoWriter->SetWatch(std::move(oWatch));
 }
 
+bool Dataset::KeepsPixels() const
+{
+    GetImage();
+    return true;
+}
+
 void Dataset::CheckOpen(const Place& oPlace) const
 {
     if (!mbOpen)

@@ -92,6 +92,7 @@ public:
     krv::datasources::AccessCapabilities GetRasterCapabilities() override;
 
     void KeepExisting() override;
+    bool KeepsPixels() const override;
     void WatchStoring(Watch oWatch) override;
 
     // Nothing before there is an image.

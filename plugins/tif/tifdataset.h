@@ -113,6 +113,7 @@ public:
     std::optional<std::vector<std::string>> CheckCloudLayout() override;
 
     krv::datasources::EncodedForm GetEncodedForm(unsigned int nLevel) override;
+    bool KeepsPixels() const override;
     bool ReadEncoded(unsigned int nLevel, const krv::datasources::BlockNumber& oBlock,
                      std::vector<unsigned char>& oBytes) override;
     bool SetEncodedForm(unsigned int nLevel, const krv::datasources::EncodedForm& oForm) override;

@@ -42,6 +42,12 @@ krv::datasources::EncodedForm TifDataset::GetEncodedForm(unsigned int nLevel)
     return DescribeBlocks(*GetCodedPage(nLevel, Place::Current()));
 }
 
+bool TifDataset::KeepsPixels() const
+{
+    GetImage();
+    return !DescribeBlocks(*mpoPage).mbLossy;
+}
+
 CodedStrile TifDataset::FindCoded(Page& oPage, const krv::datasources::BlockNumber& oBlock, const Place& oPlace) const
 {
     const std::uint64_t nNumber = GetStrile(oPage, oBlock, oPlace);

@@ -323,12 +323,22 @@ TEST(Convert, LossyCodecsKeepValidityAndAreNotAppliedUnasked)
         const std::unique_ptr<krv::gobs::Mask> poMask(oValidity.BuildMask(*poPixels));
         return std::string(poMask->GetBits(), poMask->GetBits() + poMask->GetBitsSize());
     };
-    for (const char* pOptions : {"COMPRESS=JPEG LEVEL=30", "LAYOUT=COG COMPRESS=JPEG LEVEL=30"})
+    const std::string jp2 = oFolder.File("b.jp2"), jpeg = oFolder.File("b.jpg");
+    for (const std::vector<std::string>& oLossy :
+         {std::vector<std::string>{jp2, "--options", "QUALITY=30"},
+          {jp2, "--options", "RATIO=20", "--type", "8U", "--scale", "0,255,0,254"},
+          {jpeg, "--options", "QUALITY=60"},
+          {lossy, "--options", "COMPRESS=JPEG LEVEL=30", "--type", "8U", "--scale", "0,255,0,254"},
+          {lossy, "--options", "COMPRESS=JPEG LEVEL=30"},
+          {lossy, "--options", "LAYOUT=COG COMPRESS=JPEG LEVEL=30"}})
     {
-        const auto oRun = RunConvert({lossless, lossy, "--options", pOptions});
+        SCOPED_TRACE(oLossy[0] + oLossy[2]);
+        std::vector<std::string> oArguments{lossless};
+        oArguments.insert(oArguments.end(), oLossy.begin(), oLossy.end());
+        const auto oRun = RunConvert(oArguments);
         ASSERT_EQ(oRun.code, 0) << oRun.errors;
         EXPECT_NE(oRun.errors.find("a mask says which are valid"), std::string::npos) << oRun.errors;
-        EXPECT_EQ(Valid(lossy, {0, 0, 400, 300}), Valid(lossless, {0, 0, 400, 300}));
+        EXPECT_EQ(Valid(oLossy[0], {0, 0, 400, 300}), Valid(lossless, {0, 0, 400, 300}));
     }
     const auto poLossy = OpenFile(lossy, eReadOnly);
     auto& oBitmaps = dynamic_cast<krv::datasources::IBitmapDataset&>(*poLossy);

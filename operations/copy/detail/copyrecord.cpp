@@ -139,6 +139,18 @@ MetadataMap FileRecord(const CopyPlan& oPlan)
 
 } // namespace
 
+void DropNoData(AuxiliaryData& oRecord)
+{
+    const auto Without = [](MetadataMap oMap)
+    {
+        oMap.erase(NO_DATA);
+        return oMap;
+    };
+    oRecord.SetFileMetadata(Without(oRecord.GetFileMetadata()));
+    for (unsigned int nChannel = 1; nChannel <= oRecord.GetChannelCount(); ++nChannel)
+        oRecord.SetChanMetadata(Without(oRecord.GetChanMetadata(nChannel)), nChannel);
+}
+
 AuxiliaryData MakeRecord(const CopyPlan& oPlan, const std::string& target, const TableNumbers& oTables,
                          bool bPixelsChange, bool bWithoutNoData)
 {

@@ -21,6 +21,9 @@ using TableNumbers = std::map<std::pair<std::size_t, unsigned int>, unsigned int
 krv::datasources::AuxiliaryData MakeRecord(const CopyPlan& oPlan, const std::string& target,
                                            const TableNumbers& oTables, bool bPixelsChange, bool bWithoutNoData);
 
+// Of the file and of all channels.
+void DropNoData(krv::datasources::AuxiliaryData& oRecord);
+
 // The transform of an image that begins at a pixel of another one.
 krv::ogc::cs::GeocodingInfo ShiftGeocoding(const krv::ogc::cs::GeocodingInfo& oInfo, unsigned int nX, unsigned int nY);
 

@@ -70,14 +70,20 @@ bool HasValidityInValues(const CopyPlan& oPlan)
                        [](const Part& oPart) { return oPart.validity->HasNoData() || oPart.validity->HasAlpha(); });
 }
 
-void WriteValidity(const CopyPlan& oPlan, const Target& oTarget, unsigned int nBitmap)
+void CheckLossyValidity(const Target& oTarget)
 {
-    auto* const poBitmaps = oTarget.Find<IBitmapDataset>();
-    if (poBitmaps == nullptr)
+    if (oTarget.Find<IBitmapDataset>() == nullptr)
         throw krv::DataException(oTarget.GetName() +
                                  ": its pixels change when they are encoded, so that no-data values "
                                  "and alpha mean nothing, and the format has no mask to say it; "
                                  "choose an encoding without loss");
+    Target::Warn(oTarget.GetName() +
+                 ": no-data values are not kept: pixels change when they are encoded; a mask says which are valid");
+}
+
+void WriteValidity(const CopyPlan& oPlan, const Target& oTarget, unsigned int nBitmap)
+{
+    auto* const poBitmaps = oTarget.Find<IBitmapDataset>();
     if (nBitmap == 0)
     {
         nBitmap = poBitmaps->CreateBitmap();

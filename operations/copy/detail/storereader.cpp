@@ -11,6 +11,7 @@
 #include "gobs/mask/mask.h"
 #include "gobs/raster/raster.h"
 #include "operations/copy/detail/copyrecord.h"
+#include "operations/copy/detail/copyvalidity.h"
 #include "operations/copy/detail/target.h"
 #include "operations/job/exceptions.h"
 #include "operations/job/progress.h"
@@ -103,7 +104,9 @@ std::unique_ptr<BasicWriter> MakeMask(bool bNeeded, const Target& oTarget)
 class Worker
 {
 public:
-    Worker(FilePointer poFile, const std::vector<StoredChannels>& oStored) : mpoFile(std::move(poFile))
+    // bLossy: no value says which pixels are valid, since they are stored with loss.
+    Worker(FilePointer poFile, const std::vector<StoredChannels>& oStored, bool bLossy)
+        : mpoFile(std::move(poFile)), mbLossy(bLossy)
     {
         for (const StoredChannels& oChannels : oStored)
         {
@@ -117,7 +120,7 @@ public:
     // Whether no value of its channels says which pixels are not valid.
     bool NeedsMask(std::size_t nReader) const
     {
-        return moValidities[nReader]->IsNeeded() && !HasNoData(moReaders[nReader]->GetAuxiliaryData());
+        return moValidities[nReader]->IsNeeded() && (mbLossy || !HasNoData(moReaders[nReader]->GetAuxiliaryData()));
     }
 
     // The pixels at a place of the new file, which are those at another one of the reader's. The valid ones are added
@@ -149,6 +152,7 @@ private:
     }
 
     FilePointer mpoFile;
+    bool mbLossy;
     std::vector<std::shared_ptr<IRasterReader>> moReaders;
     std::vector<std::unique_ptr<ReaderValidity>> moValidities; // after the readers, which they stand on
 };
@@ -193,11 +197,17 @@ void CheckTarget(const std::vector<std::string>& oSources, const std::string& ta
 void StoreReaders(const SourceFile& oFile, const std::vector<StoredChannels>& oStored, const PixelWindow& oWindow,
                   const Target& oTarget, const char* pPart)
 {
-    FileWorkers<Worker> oWorkers(oFile, [&oStored](FilePointer poFile)
-                                 { return std::make_unique<Worker>(std::move(poFile), oStored); });
-    const Worker oFirst(FilePointer(&oFile, {false}), oStored); // for what there is one of
+    const bool bLossy = oTarget.IsLossy();
+    FileWorkers<Worker> oWorkers(oFile, [&oStored, bLossy](FilePointer poFile)
+                                 { return std::make_unique<Worker>(std::move(poFile), oStored, bLossy); });
+    const Worker oFirst(FilePointer(&oFile, {false}), oStored, bLossy); // for what there is one of
     StorePlace(oFirst.GetReader(0), oWindow, oTarget);
-    const AuxiliaryData oRecord = JoinRecords(oFirst, oStored);
+    AuxiliaryData oRecord = JoinRecords(oFirst, oStored);
+    if (bLossy && HasNoData(oRecord))
+    {
+        CheckLossyValidity(oTarget);
+        DropNoData(oRecord);
+    }
     oTarget.Try("the metadata", [&] { oTarget.Get().WriteAuxiliaryData(oRecord); });
 
     krv::threading::IExecutor* const poExecutor = oTarget.GetExecutor();

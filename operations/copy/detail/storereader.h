@@ -37,9 +37,10 @@ struct StoredChannels
 };
 
 // Stores a window of what readers of one size make of a file into a new file that was laid out for it: pixels, record,
-// geocoding and reference system, and a mask of validity where no value says which pixels are valid, which are those
-// that are valid in any of the readers then. Each thread of the target's executor reads and encodes; the file is the
-// same, byte for byte, for any number of threads. pPart: a word for the progress.
+// geocoding and reference system, and a mask of validity where no value says which pixels are valid, or values are
+// encoded with loss; its valid pixels are those that are valid in any of the readers. Each thread of the target's
+// executor reads and encodes; the file is the same, byte for byte, for any number of threads. pPart: a word for the
+// progress.
 void StoreReaders(const SourceFile& oFile, const std::vector<StoredChannels>& oStored, const PixelWindow& oWindow,
                   const Target& oTarget, const char* pPart);
 

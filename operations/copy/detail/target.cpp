@@ -96,8 +96,8 @@ Target::Target(const CopyPlan& oPlan, const TargetForm& oForm, const Progress& o
 
 bool Target::IsLossy() const
 {
-    auto* const poBlocks = Find<IEncodedBlocks>();
-    return poBlocks != nullptr && poBlocks->GetEncodedForm(1).mbLossy;
+    const auto* const poNew = Find<INewFileDataset>();
+    return poNew != nullptr && !poNew->KeepsPixels();
 }
 
 void Target::Make(const std::string& options)

@@ -28,6 +28,8 @@ public:
               const Place& oPlace);
     const std::shared_ptr<TileStore>& GetTiles() const { return mpoTiles; }
 
+    bool IsLossless() const { return moOptions.IsLossless(); }
+
     const krv::datasources::AuxiliaryData& GetRecord() const { return moRecord; }
     void SetRecord(const krv::datasources::AuxiliaryData& oRecord);
     const support::GeoTags& GetGeoTags() const { return moGeoTags; }

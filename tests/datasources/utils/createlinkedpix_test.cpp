@@ -72,6 +72,7 @@ public:
         return eDone;
     }
     void KeepExisting() override {}
+    bool KeepsPixels() const override { return true; }
 
 private:
     std::string moFileName;

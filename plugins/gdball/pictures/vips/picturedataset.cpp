@@ -157,6 +157,12 @@ void PictureDataset::WriteAuxiliaryData(const AuxiliaryData& oData)
     StoreBeside(std::move(oAuxXml));
 }
 
+bool PictureDataset::KeepsPixels() const
+{
+    GetImage();
+    return !mpoWriter || mpoWriter->IsLossless();
+}
+
 krv::ogc::cs::ICRS* PictureDataset::ReadCRS() const
 {
     std::unique_ptr<krv::ogc::cs::ICRS> poCRS = GetSidecars().ReadCRS();

@@ -29,6 +29,7 @@ public:
 
     void Create(unsigned int nWidth, unsigned int nHeight, const std::vector<krv::gobs::DataType>& oTypes) override;
     using support::Dataset::Create;
+    bool KeepsPixels() const override;
     krv::datasources::AuxiliaryData ReadAuxiliaryData() override;
     void WriteAuxiliaryData(const krv::datasources::AuxiliaryData& oData) override;
     krv::ogc::cs::ICRS* ReadCRS() const override;

@@ -180,6 +180,11 @@ void PictureWriter::Make(unsigned int nWidth, unsigned int nHeight, const std::v
     mbChanged = true;
 }
 
+bool PictureWriter::IsLossless() const
+{
+    return meKind != PictureKind::eJpeg && (meKind != PictureKind::eWebp || moOptions.mbLossless);
+}
+
 VipsInterpretation PictureWriter::GetMeaning() const
 {
     const bool bColours = mpoPixels->GetLayout().GetChannelCount() > 2;

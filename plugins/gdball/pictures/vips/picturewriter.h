@@ -40,6 +40,7 @@ public:
               const Place& oPlace);
     const std::shared_ptr<support::PlainSource>& GetPixels() const { return mpoPixels; }
     PictureKind GetKind() const { return meKind; }
+    bool IsLossless() const;
     // What readers will take the channels for.
     VipsInterpretation GetMeaning() const;
     // Throws DataException when writing has ended.
