@@ -88,19 +88,20 @@ public:
         const std::uint32_t nDown = 32 - nBits;
         moDown = simd::LoadFirst<4>(&nDown);
         for (unsigned int i = 0; i < 4; ++i)
-            moUp[i] = 1 << ((nPhase + i * nBits) & 7);
+            moUp[i] = 1U << ((nPhase + i * nBits) & 7);
         moBytes = Shuffle::Make([&](std::size_t i) { return (nPhase + i / 4 * nBits) / 8 + 3 - i % 4; });
     }
 
     Ints Take(Bytes oBytes) const
     {
-        const Ints oTop = As<std::int32_t>(moBytes(oBytes)) * moUp;
+        // Bits above the sample go, which unsigned numbers alone may lose.
+        const auto oTop = As<std::int32_t>(As<std::uint32_t>(moBytes(oBytes)) * moUp);
         return mbSigned ? simd::ShiftDown(oTop, moDown) : Ints(simd::ShiftDown(Numbers(oTop), moDown));
     }
 
 private:
     Shuffle moBytes;
-    Ints moUp;
+    Numbers moUp;
     Bytes moDown;
     bool mbSigned;
 };
