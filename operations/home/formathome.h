@@ -9,7 +9,7 @@ namespace krv::operations
 {
 
 // A home of one's own: a folder with a registry, descriptions and plug-ins, that KRVHOME may name.
-// Example: {"/home/me/formats", {"build/myformat.so"}}; programs then run with KRVHOME=/home/me/formats.
+// Example: {"formats", {"build/myformat.so"}}; programs then run with KRVHOME naming that folder.
 struct HomeRequest
 {
     std::string folder; // made when it is not there
