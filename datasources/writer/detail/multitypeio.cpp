@@ -112,7 +112,7 @@ MultiTypeIO::MultiTypeIO(std::vector<WriterGroup> oGroups, const krv::gobs::Data
     mnStreamed = std::clamp(STREAM_BYTES / std::max<std::uint64_t>(SumOwnBytes(), 1) / STREAM_STEP * STREAM_STEP,
                             STREAM_STEP, MOST_STREAMED);
     for (std::size_t n = 0; mbMemory && n < moGroups.size(); ++n)
-        moStreamed.emplace_back(moOwnBytes[n] * mnStreamed);
+        moStreamTargets.push_back(moStreamed.emplace_back(moOwnBytes[n] * mnStreamed).data());
     mnPixelBytes = moSplitPositions.size() * (oType.GetValueBits() / 8);
     moSplitter.emplace(krv::gobs::QRFDataType2RasterBufferType(oType),
                        static_cast<unsigned int>(moSplitPositions.size()), oTargets);
@@ -217,21 +217,19 @@ bool MultiTypeIO::WriteInPlace(const PixelRect& oBand, const unsigned char* pSou
 void MultiTypeIO::StreamRun(const std::vector<Piece>& oPieces, const unsigned char* pSource, std::uint64_t nPixels,
                             std::vector<std::uint64_t>& oChanged)
 {
-    std::vector<unsigned char*> oTargets;
-    for (std::vector<unsigned char>& oBytes : moStreamed)
-        oTargets.push_back(oBytes.data());
     auto oPiece = oPieces.begin();
     for (std::uint64_t nFirst = 0; nFirst < nPixels; nFirst += mnStreamed)
     {
         const std::uint64_t nEnd = std::min(nFirst + mnStreamed, nPixels);
         krv::simd::Fetch(pSource + nEnd * mnPixelBytes, (nEnd - nFirst) * mnPixelBytes);
-        moSplitter->Run(pSource + nFirst * mnPixelBytes, oTargets, nEnd - nFirst, oChanged.data());
+        moSplitter->Run(pSource + nFirst * mnPixelBytes, moStreamTargets, nEnd - nFirst, oChanged.data());
         for (std::uint64_t nAt = nFirst; nAt < nEnd;)
         {
             const std::uint64_t nPieceEnd = oPiece->mnFirst + oPiece->mnPixels, nUpTo = std::min(nEnd, nPieceEnd);
             for (std::size_t n = 0; n < moGroups.size(); ++n)
                 krv::simd::StreamCopy(oPiece->moTargets[n] + (nAt - oPiece->mnFirst) * moOwnBytes[n],
-                                      oTargets[n] + (nAt - nFirst) * moOwnBytes[n], (nUpTo - nAt) * moOwnBytes[n]);
+                                      moStreamTargets[n] + (nAt - nFirst) * moOwnBytes[n],
+                                      (nUpTo - nAt) * moOwnBytes[n]);
             oPiece += nUpTo == nPieceEnd ? 1 : 0;
             nAt = nUpTo;
         }

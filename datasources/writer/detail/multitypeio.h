@@ -80,6 +80,7 @@ private:
     std::optional<krv::raster::Splitter> moSplitter;
     std::optional<krv::raster::Merger> moMerger;        // made by the first reading
     std::vector<std::vector<unsigned char>> moStreamed; // for each group in memory
+    std::vector<unsigned char*> moStreamTargets;        // the beginnings of moStreamed
 };
 
 } // namespace krv::datasources::detail
